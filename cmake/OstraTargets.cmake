@@ -1,0 +1,50 @@
+# One place that says how this project's code is compiled; every target goes through one of these helpers.
+
+set(OSTRA_SANITIZE "" CACHE STRING "Sanitizers to build with, as in -fsanitize= (empty: none)")
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+set(CMAKE_C_STANDARD 11)
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+set(CMAKE_CXX_VISIBILITY_PRESET hidden)
+set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
+find_package(Threads REQUIRED)
+
+add_library(ostra_options INTERFACE)
+target_include_directories(ostra_options INTERFACE "${PROJECT_SOURCE_DIR}/src" "${PROJECT_SOURCE_DIR}/include")
+target_compile_options(ostra_options INTERFACE
+  -Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion -Wshadow -Wcast-align -Wformat=2 -Werror
+  $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor -Woverloaded-virtual -Wold-style-cast -Wextra-semi>
+  -ffunction-sections -fdata-sections
+  "-fdebug-prefix-map=${PROJECT_SOURCE_DIR}/="
+  # Locations in exception traces begin with \src\ and do not depend on where the tree was checked out. (The empty
+  # expression keeps the last backslash from escaping the list's separator.)
+  "-fmacro-prefix-map=${PROJECT_SOURCE_DIR}/src/=\\src\\$<1:>")
+target_link_libraries(ostra_options INTERFACE Threads::Threads)
+if(OSTRA_SANITIZE)
+  target_compile_options(ostra_options INTERFACE -fsanitize=${OSTRA_SANITIZE} -fno-omit-frame-pointer -fno-sanitize-recover=all)
+  target_link_options(ostra_options INTERFACE -fsanitize=${OSTRA_SANITIZE})
+endif()
+
+# ostra_library(NAME SOURCES ... [LINK ...]): a static library of this project.
+function(ostra_library NAME)
+  cmake_parse_arguments(ARG "" "" "SOURCES;LINK" ${ARGN})
+  add_library(${NAME} STATIC ${ARG_SOURCES})
+  target_link_libraries(${NAME} PUBLIC ostra_options ${ARG_LINK})
+endfunction()
+
+# ostra_program(NAME SOURCES ... [LINK ...]): an executable of this project.
+function(ostra_program NAME)
+  cmake_parse_arguments(ARG "" "" "SOURCES;LINK" ${ARGN})
+  add_executable(${NAME} ${ARG_SOURCES})
+  target_link_libraries(${NAME} PRIVATE ${ARG_LINK} ostra_options)
+endfunction()
+
+# ostra_test(NAME SOURCES ... [LINK ...]): a GoogleTest program, run by ctest as one test under its name.
+function(ostra_test NAME)
+  cmake_parse_arguments(ARG "" "" "SOURCES;LINK" ${ARGN})
+  ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest)
+  target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
+  add_test(NAME ${NAME} COMMAND ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:${NAME}>)
+  set_tests_properties(${NAME} PROPERTIES TIMEOUT 300)
+endfunction()

@@ -1,0 +1,20 @@
+#include "Platform/DeviceFiles.h"
+
+namespace Varnholt::Platform {
+namespace {
+DeviceFileSystem* replacement = nullptr;
+}
+
+DeviceFileSystem& DeviceFiles() {
+    return replacement ? *replacement : SystemDeviceFiles();
+}
+
+ScopedDeviceFiles::ScopedDeviceFiles(DeviceFileSystem& fileSystem) : previous(replacement) {
+    replacement = &fileSystem;
+}
+
+ScopedDeviceFiles::~ScopedDeviceFiles() {
+    replacement = previous;
+}
+
+}  // namespace Varnholt::Platform

@@ -1,0 +1,42 @@
+#pragma once
+
+#include <utility>
+
+namespace Varnholt::Platform {
+
+/// Names a waitable object, a thread or an open device file. A handle that names nothing is refused with
+/// `Errors::InvalidHandle`, whatever its value; it is never dereferenced by callers.
+using Handle = void*;
+inline constexpr Handle NoHandle = nullptr;
+
+/// What an open that failed returns, as opposed to `NoHandle`.
+Handle InvalidHandle();
+
+/// Closes a waitable object or thread handle. The object lives on while a wait or a thread still needs it.
+bool Close(Handle handle);
+
+/// Owns one waitable object or thread handle and closes it.
+class OwnedHandle final {
+  public:
+    OwnedHandle() = default;
+    explicit OwnedHandle(Handle owned) : handle(owned) {}
+    OwnedHandle(OwnedHandle&& other) noexcept : handle(std::exchange(other.handle, NoHandle)) {}
+    OwnedHandle& operator=(OwnedHandle&& other) noexcept {
+        std::swap(handle, other.handle);
+        return *this;
+    }
+    ~OwnedHandle() { Reset(); }
+
+    Handle Get() const { return handle; }
+    explicit operator bool() const { return handle != NoHandle; }
+    void Reset() {
+        if (handle != NoHandle) {
+            Close(std::exchange(handle, NoHandle));
+        }
+    }
+
+  private:
+    Handle handle = NoHandle;
+};
+
+}  // namespace Varnholt::Platform

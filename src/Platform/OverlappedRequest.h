@@ -1,0 +1,49 @@
+#pragma once
+
+#include <cstdint>
+
+#include "Platform/DeviceFiles.h"
+
+namespace Varnholt::Platform {
+
+/// One overlapped operation with its claim on the caller's buffer. Success, pending, failure and abort end in
+/// one place: the object does not die, and does not start anew, before its transfer has completed.
+///
+/// Used by one thread (cancelling reaches only the transfers of the thread that started them).
+class OverlappedRequest final {
+  public:
+    /// `completionEvent` is an auto-reset event that outlives the request; several requests may share one.
+    explicit OverlappedRequest(Handle completionEvent);
+    /// Ends a transfer that still runs and waits for its completion.
+    ~OverlappedRequest();
+    OverlappedRequest(const OverlappedRequest&) = delete;
+    OverlappedRequest& operator=(const OverlappedRequest&) = delete;
+
+    /// As the operations of `DeviceFileSystem`. The buffer must outlive the request or its completion.
+    bool StartRead(Handle file, void* buffer, std::uint32_t length);
+    bool StartWrite(Handle file, const void* buffer, std::uint32_t length);
+    bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
+                      void* output, std::uint32_t outputSize);
+
+    /// Result of the last start, without waiting. After a start that failed: that failure again.
+    bool GetResult(std::uint32_t& transferred);
+
+    /// Cancels the transfer if it still runs, waits until it has completed, and gives the bytes it moved.
+    /// `LastError` is left as it was.
+    std::uint32_t CancelAndWait();
+
+    bool IsRunning() const { return state == State::Running; }
+    Handle CompletionEvent() const { return record.event; }
+
+  private:
+    enum class State { Idle, Running, Completed, FailedToStart };
+
+    bool Started(Handle startedOn, bool completedAtOnce);
+
+    Overlapped record;
+    Handle file = NoHandle;
+    State state = State::Idle;
+    ErrorCode startError = Errors::Success;
+};
+
+}  // namespace Varnholt::Platform
