@@ -25,7 +25,7 @@ Is64BitHostQuery LookUp64BitHostQuery();
 
 /// Tests replace what the two questions above answer; `nullopt` gives the answer back to the host.
 void OverrideVersionRecord(std::optional<VersionRecord> record);
-/// Affects `TransportIs64Bit` (see SystemHelperWin) only; the query's own entry point is left alone.
+/// Wins over the query inside `Is64BitOS` (Utilities/Tools); the query's own entry point is left alone.
 void Override64BitHost(std::optional<bool> answer);
 std::optional<bool> Overridden64BitHost();
 

@@ -1,0 +1,155 @@
+#include "DeviceDriver/Generic/Configuration/Property.h"
+
+#include "DeviceDriver/Generic/Utilities/EndianConversion.h"
+#include "Utilities/Exceptions/Exceptions.h"
+#include "Utilities/Exceptions/Trace.h"
+
+namespace Varnholt::DeviceDriver::Generic::Configuration {
+
+namespace EndianConversion = Utilities::EndianConversion;
+using Varnholt::Utilities::Exceptions::Here;
+using Varnholt::Utilities::Exceptions::RuntimeException;
+
+namespace {
+
+constexpr const char* InvalidType = "Invalid configuration data type.";
+
+}  // namespace
+
+Property::Property(const std::vector<float>& values) : floats(values), type(TypeFloatVector) {}
+Property::Property(const std::vector<std::int32_t>& values) : longs(values), type(TypeLongVector) {}
+Property::Property(float value) : floats(1, value), type(TypeFloat) {}
+Property::Property(std::int32_t value) : longs(1, value), type(TypeLong) {}
+Property::Property(std::int16_t value) : Property(std::int32_t{value}) {}
+Property::Property(std::int8_t value) : Property(std::int32_t{value}) {}
+
+Property& Property::Assign(float value) try {
+    AssignInternal(std::vector<float>(1, value), TypeFloat);
+    return *this;
+}
+TRACED
+
+Property& Property::Assign(std::int32_t value) try {
+    AssignInternal(std::vector<std::int32_t>(1, value), TypeLong);
+    return *this;
+}
+TRACED
+
+Property& Property::Assign(std::int16_t value) {
+    return Assign(std::int32_t{value});
+}
+Property& Property::Assign(std::int8_t value) {
+    return Assign(std::int32_t{value});
+}
+
+Property& Property::Assign(const std::vector<float>& values) try {
+    AssignInternal(values, TypeFloatVector);
+    return *this;
+}
+TRACED
+
+Property& Property::Assign(const std::vector<std::int32_t>& values) try {
+    AssignInternal(values, TypeLongVector);
+    return *this;
+}
+TRACED
+
+Property& Property::Assign(std::span<const std::uint8_t> bytes, bool bigEndian) try {
+    const std::size_t count = bytes.size() / ElementSize;
+    switch (type) {
+        case TypeLong:
+        case TypeLongVector:
+            longs.resize(count);
+            for (std::size_t i = 0; i < count; ++i) {
+                EndianConversion::ByteArrayToLong(&bytes[ElementSize * i], longs[i], bigEndian);
+            }
+            return *this;
+        case TypeFloat:
+        case TypeFloatVector:
+            floats.resize(count);
+            for (std::size_t i = 0; i < count; ++i) {
+                EndianConversion::ByteArrayToFloat(&bytes[ElementSize * i], floats[i], bigEndian);
+            }
+            return *this;
+        case TypeNone:
+            break;
+    }
+    throw RuntimeException(InvalidType, Here());
+}
+TRACED
+
+void Property::AssignInternal(const std::vector<float>& values, PropertyType newType) try {
+    floats = values;
+    longs.clear();
+    type = newType;
+}
+TRACED
+
+void Property::AssignInternal(const std::vector<std::int32_t>& values, PropertyType newType) try {
+    longs = values;
+    floats.clear();
+    type = newType;
+}
+TRACED
+
+std::size_t Property::SizeOf() const {
+    switch (type) {
+        case TypeLong:
+        case TypeLongVector:
+            return ElementSize * longs.size();
+        case TypeFloat:
+        case TypeFloatVector:
+            return ElementSize * floats.size();
+        case TypeNone:
+            break;
+    }
+    return 0;
+}
+
+std::int32_t Property::AsLong() const try {
+    if (longs.empty()) {
+        throw RuntimeException(InvalidType, Here());
+    }
+    return longs.front();
+}
+TRACED
+
+float Property::AsFloat() const try {
+    if (floats.empty()) {
+        throw RuntimeException(InvalidType, Here());
+    }
+    return floats.front();
+}
+TRACED
+
+std::vector<std::uint8_t> Property::AsByteVector(bool bigEndian) const try {
+    std::vector<std::uint8_t> bytes(SizeOf());
+    WriteBytes(bytes.data(), bigEndian);
+    return bytes;
+}
+TRACED
+
+void Property::WriteBytes(std::uint8_t* bytes, bool bigEndian) const try {
+    switch (type) {
+        case TypeLong:
+        case TypeLongVector:
+            for (const std::int32_t value : longs) {
+                EndianConversion::LongToByteArray(value, bytes, bigEndian);
+                bytes += ElementSize;
+            }
+            return;
+        case TypeFloat:
+        case TypeFloatVector:
+            for (const float value : floats) {
+                EndianConversion::FloatToByteArray(value, bytes, bigEndian);
+                bytes += ElementSize;
+            }
+            return;
+        case TypeNone:
+            break;
+    }
+    throw RuntimeException(InvalidType, Here());
+}
+TRACED
+
+}  // namespace Varnholt::DeviceDriver::Generic::Configuration

@@ -1,0 +1,90 @@
+#include "DeviceDriver/Generic/Utilities/PrecisionTime.h"
+
+#include <cmath>
+
+#include "Platform/Time.h"
+
+namespace Varnholt::DeviceDriver::Generic::Utilities {
+namespace {
+
+constexpr std::int32_t MicrosecondsPerSecond = 1000000;
+constexpr double CounterRange = 4294967296.0;  // microseconds are kept in 32 bits
+
+const std::uint64_t counterFrequency = Platform::PerformanceFrequency();
+
+// Seconds wrap: values from outside may be anything.
+std::int32_t Sum(std::int32_t a, std::int32_t b) {
+    return static_cast<std::int32_t>(static_cast<std::uint32_t>(a) + static_cast<std::uint32_t>(b));
+}
+std::int32_t Difference(std::int32_t a, std::int32_t b) {
+    return static_cast<std::int32_t>(static_cast<std::uint32_t>(a) - static_cast<std::uint32_t>(b));
+}
+
+}  // namespace
+
+PrecisionTime::PrecisionTime(std::int32_t seconds, std::int32_t microseconds)
+    : impl(new PrecisionTimeImpl{seconds, microseconds}) {}
+
+PrecisionTime::PrecisionTime(const PrecisionTime& other) : impl(new PrecisionTimeImpl(*other.impl)) {}
+
+PrecisionTime& PrecisionTime::operator=(const PrecisionTime& other) {
+    *impl = *other.impl;
+    return *this;
+}
+
+void PrecisionTime::Set(std::int32_t seconds, std::int32_t microseconds) {
+    *impl = {seconds, microseconds};
+}
+
+void PrecisionTime::SetToNow() {
+    if (counterFrequency != 0) {
+        SetFromReadings(counterFrequency, Platform::PerformanceCounter(), 0);
+    } else {
+        SetFromReadings(0, 0, Platform::TickCount());
+    }
+}
+
+void PrecisionTime::SetFromReadings(std::uint64_t frequency, std::uint64_t counter, std::uint32_t ticks) {
+    if (frequency != 0) {
+        const double elapsed =
+            std::trunc(static_cast<double>(counter) * MicrosecondsPerSecond / static_cast<double>(frequency));
+        const auto microseconds = static_cast<std::uint32_t>(std::fmod(elapsed, CounterRange));
+        Set(static_cast<std::int32_t>(microseconds / MicrosecondsPerSecond),
+            static_cast<std::int32_t>(microseconds % MicrosecondsPerSecond));
+    } else {
+        const auto signedTicks = static_cast<std::int32_t>(ticks);
+        Set(signedTicks / 1000, signedTicks % 1000 * 1000);
+    }
+}
+
+PrecisionTime& PrecisionTime::operator+=(const PrecisionTime& other) {
+    impl->seconds = Sum(impl->seconds, other.impl->seconds);
+    impl->microseconds = Sum(impl->microseconds, other.impl->microseconds);
+    if (impl->microseconds >= MicrosecondsPerSecond) {
+        impl->seconds = Sum(impl->seconds, 1);
+        impl->microseconds -= MicrosecondsPerSecond;
+    }
+    return *this;
+}
+
+PrecisionTime& PrecisionTime::operator-=(const PrecisionTime& other) {
+    impl->seconds = Difference(impl->seconds, other.impl->seconds);
+    impl->microseconds = Difference(impl->microseconds, other.impl->microseconds);
+    if (impl->microseconds < 0) {
+        impl->seconds = Difference(impl->seconds, 1);
+        impl->microseconds += MicrosecondsPerSecond;
+    }
+    return *this;
+}
+
+void PrecisionTime::GetElapsed(std::int32_t& seconds, std::int32_t& milliseconds,
+                               std::int32_t& microseconds) const {
+    PrecisionTime elapsed;
+    elapsed.SetToNow();
+    elapsed -= *this;
+    seconds = elapsed.GetSeconds();
+    milliseconds = elapsed.GetMilliseconds();
+    microseconds = elapsed.GetMicroseconds();
+}
+
+}  // namespace Varnholt::DeviceDriver::Generic::Utilities

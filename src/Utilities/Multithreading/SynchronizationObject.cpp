@@ -1,0 +1,7 @@
+#include "Utilities/Multithreading/SynchronizationObject.h"
+
+namespace Varnholt::Utilities::Multithreading {
+
+SynchronizationObject::SynchronizationObject(std::unique_ptr<Impl> owned) : impl(owned.release()) {}
+
+}  // namespace Varnholt::Utilities::Multithreading

@@ -1,0 +1,58 @@
+#pragma once
+
+#include <string>
+
+#include "Platform/Handle.h"
+#include "Platform/WaitableObjects.h"
+#include "Utilities/Exceptions/Exceptions.h"
+#include "Utilities/Exceptions/Trace.h"
+
+namespace Varnholt::Utilities::Multithreading {
+
+/// The locking half of a lock that is a waitable object of the platform; unlocking is what the kinds differ
+/// in.
+template <class Base>
+class Win32Lockable : public Base {
+  public:
+    /// Takes ownership of `newHandle`; `NoHandle` is refused with `InvalidArgumentException`.
+    Win32Lockable(Platform::Handle newHandle, const std::string& objectName);
+
+    void Lock() override { Platform::Wait(handle.Get(), Platform::Infinite); }
+    /// Throws `InvalidArgumentException` when the previous owner of a mutex ended without releasing it. The
+    /// mutex is then free again: a caller that is told of a failure does not unlock.
+    bool TryLock(int timeout) override;
+    Platform::Handle GetHandle() override { return handle.Get(); }
+
+  private:
+    Platform::OwnedHandle handle;
+    std::string name;
+};
+
+template <class Base>
+Win32Lockable<Base>::Win32Lockable(Platform::Handle newHandle, const std::string& objectName) try
+    : handle(newHandle), name(objectName) {
+    if (!handle) {
+        throw Exceptions::InvalidArgumentException("handle is NULL", Exceptions::Here());
+    }
+}
+TRACED
+
+template <class Base>
+bool Win32Lockable<Base>::TryLock(int timeout) try {
+    const std::uint32_t limit = timeout < 0 ? Platform::Infinite : static_cast<std::uint32_t>(timeout);
+    switch (Platform::Wait(handle.Get(), limit)) {
+        case Platform::WaitResult::Signalled:
+            return true;
+        case Platform::WaitResult::TimedOut:
+            return false;
+        case Platform::WaitResult::Abandoned:
+            this->Unlock();
+            break;
+        case Platform::WaitResult::Failed:
+            break;
+    }
+    throw Exceptions::InvalidArgumentException("invalid mutex", Exceptions::Here());
+}
+TRACED
+
+}  // namespace Varnholt::Utilities::Multithreading
