@@ -1,0 +1,56 @@
+#include "Platform/Usb/InterceptingDevice.h"
+
+namespace Varnholt::Platform::Usb {
+
+ErrorCode InterceptingDevice::Submit(Transfer& transfer) {
+    const auto copy = std::make_shared<Copy>();
+    static_cast<Transfer&>(*copy) = transfer;
+    copy->client = this;
+    copy->deviceData = nullptr;
+    copy->original = &transfer;
+    {
+        const std::lock_guard lock(mutex);
+        copy->id = ++lastId;
+        running[&transfer] = copy;
+    }
+    const std::uint64_t id = copy->id;
+    BeforeSubmit(id, *copy);
+    const ErrorCode code = device->Submit(*copy);
+    if (code != Errors::Success) {
+        Take(transfer);
+        Refused(id, *copy, code);
+    }
+    return code;
+}
+
+void InterceptingDevice::Cancel(Transfer& transfer) {
+    std::shared_ptr<Copy> copy;
+    {
+        const std::lock_guard lock(mutex);
+        if (const auto found = running.find(&transfer); found != running.end()) {
+            copy = found->second;
+        }
+    }
+    if (copy) {
+        device->Cancel(*copy);
+    }
+}
+
+std::shared_ptr<InterceptingDevice::Copy> InterceptingDevice::Take(Transfer& original) {
+    const std::lock_guard lock(mutex);
+    const auto found = running.find(&original);
+    std::shared_ptr<Copy> copy = std::move(found->second);
+    running.erase(found);
+    return copy;
+}
+
+void InterceptingDevice::TransferCompleted(Transfer& transfer) noexcept {
+    Transfer& original = *static_cast<Copy&>(transfer).original;
+    const std::shared_ptr<Copy> copy = Take(original);
+    AfterCompletion(copy->id, *copy);
+    original.status = copy->status;
+    original.actualLength = copy->actualLength;
+    original.client->TransferCompleted(original);
+}
+
+}  // namespace Varnholt::Platform::Usb

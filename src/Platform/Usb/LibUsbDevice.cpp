@@ -1,0 +1,292 @@
+#include "Platform/Usb/LibUsbDevice.h"
+
+#include <fcntl.h>
+#include <libusb-1.0/libusb.h>
+#include <signal.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <atomic>
+#include <cerrno>
+#include <chrono>
+#include <condition_variable>
+#include <mutex>
+#include <thread>
+#include <vector>
+
+#include "Platform/Usb/LibUsbErrors.h"
+#include "Protocol/Instrument.h"
+
+namespace Varnholt::Platform::Usb {
+namespace {
+
+constexpr int InterfaceNumber = 0;
+constexpr int ConfigurationValue = 1;
+/// A device that has just been plugged in can be opened before the kernel has configured it.
+constexpr auto ClaimPatience = std::chrono::milliseconds(2000);
+constexpr auto ClaimRetryPause = std::chrono::milliseconds(20);
+
+/// A transfer under way: libusb's record, and for control transfers the buffer with the setup bytes in front.
+struct Submission {
+    class LibUsbDevice* device = nullptr;
+    libusb_transfer* transfer = nullptr;
+    Transfer* owner = nullptr;
+    std::vector<std::uint8_t> controlBuffer;
+
+    Submission() : transfer(libusb_alloc_transfer(0)) {}
+    ~Submission() { libusb_free_transfer(transfer); }
+    Submission(const Submission&) = delete;
+    Submission& operator=(const Submission&) = delete;
+};
+
+class LibUsbDevice final : public UsbDevice {
+  public:
+    LibUsbDevice(int deviceFile, libusb_context* ownContext, libusb_device_handle* openHandle)
+        : file(deviceFile), context(ownContext), handle(openHandle) {
+        // Signals are the host program's business: its own threads take them.
+        sigset_t all;
+        sigset_t before;
+        sigfillset(&all);
+        pthread_sigmask(SIG_SETMASK, &all, &before);
+        try {
+            events = std::thread([this] { HandleEvents(); });
+        } catch (...) {
+            pthread_sigmask(SIG_SETMASK, &before, nullptr);
+            CloseAll();
+            throw;
+        }
+        pthread_sigmask(SIG_SETMASK, &before, nullptr);
+    }
+
+    ~LibUsbDevice() override {
+        {
+            std::unique_lock lock(mutex);
+            for (Submission* submission : running) {
+                libusb_cancel_transfer(submission->transfer);
+            }
+            idle.wait(lock, [this] { return running.empty() && completing == 0; });
+        }
+        Release();
+        closing = true;
+        libusb_interrupt_event_handler(context);
+        events.join();
+        CloseAll();
+    }
+
+    std::vector<EndpointInfo> Endpoints() override;
+    ErrorCode Claim() override;
+    void Release() override;
+    ErrorCode Submit(Transfer& transfer) override;
+    void Cancel(Transfer& transfer) override;
+    ErrorCode ClearHalt(std::uint8_t endpoint) override {
+        return ErrorFromLibUsb(libusb_clear_halt(handle, endpoint));
+    }
+
+  private:
+    static void LIBUSB_CALL Completed(libusb_transfer* transfer);
+    void Complete(Submission& submission);
+    void HandleEvents();
+    void CloseAll();
+    std::unique_ptr<Submission> TakeSpare();
+
+    const int file;
+    libusb_context* const context;
+    libusb_device_handle* const handle;
+    std::thread events;
+    std::atomic<bool> closing = false;
+
+    std::mutex mutex;  // guards what follows; never held while a client is called
+    std::condition_variable idle;
+    std::vector<Submission*> running;
+    std::vector<std::unique_ptr<Submission>> spare;
+    int completing = 0;  // clients being told of a completion
+    bool claimed = false;
+};
+
+void LibUsbDevice::HandleEvents() {
+    while (!closing) {
+        libusb_handle_events(context);
+    }
+}
+
+void LibUsbDevice::CloseAll() {
+    spare.clear();
+    libusb_close(handle);
+    libusb_exit(context);
+    close(file);
+}
+
+std::vector<EndpointInfo> LibUsbDevice::Endpoints() {
+    std::vector<EndpointInfo> endpoints;
+    libusb_config_descriptor* configuration = nullptr;
+    if (libusb_get_config_descriptor(libusb_get_device(handle), 0, &configuration) != LIBUSB_SUCCESS) {
+        return endpoints;
+    }
+    if (configuration->bNumInterfaces > 0 && configuration->interface[0].num_altsetting > 0) {
+        const libusb_interface_descriptor& setting = configuration->interface[0].altsetting[0];
+        for (int i = 0; i < setting.bNumEndpoints; ++i) {
+            const libusb_endpoint_descriptor& endpoint = setting.endpoint[i];
+            endpoints.push_back({endpoint.bEndpointAddress, endpoint.bmAttributes, endpoint.wMaxPacketSize});
+        }
+    }
+    libusb_free_config_descriptor(configuration);
+    return endpoints;
+}
+
+ErrorCode LibUsbDevice::Claim() {
+    const std::lock_guard lock(mutex);
+    if (claimed) {
+        return Errors::Success;
+    }
+    libusb_set_auto_detach_kernel_driver(handle, 1);
+    const auto patienceEnds = std::chrono::steady_clock::now() + ClaimPatience;
+    for (;;) {
+        int configuration = 0;
+        int result = libusb_get_configuration(handle, &configuration);
+        if (result == LIBUSB_SUCCESS && configuration != ConfigurationValue) {
+            result = libusb_set_configuration(handle, ConfigurationValue);
+        }
+        if (result == LIBUSB_SUCCESS) {
+            result = libusb_claim_interface(handle, InterfaceNumber);
+        }
+        if (result == LIBUSB_SUCCESS) {
+            claimed = true;
+            return Errors::Success;
+        }
+        if (result != LIBUSB_ERROR_NOT_FOUND || std::chrono::steady_clock::now() >= patienceEnds) {
+            return ErrorFromLibUsb(result);
+        }
+        std::this_thread::sleep_for(ClaimRetryPause);
+    }
+}
+
+void LibUsbDevice::Release() {
+    const std::lock_guard lock(mutex);
+    if (claimed) {
+        libusb_release_interface(handle, InterfaceNumber);
+        claimed = false;
+    }
+}
+
+std::unique_ptr<Submission> LibUsbDevice::TakeSpare() {
+    const std::lock_guard lock(mutex);
+    if (spare.empty()) {
+        return nullptr;
+    }
+    std::unique_ptr<Submission> submission = std::move(spare.back());
+    spare.pop_back();
+    return submission;
+}
+
+ErrorCode LibUsbDevice::Submit(Transfer& transfer) {
+    std::unique_ptr<Submission> submission = TakeSpare();
+    if (!submission) {
+        submission = std::make_unique<Submission>();
+        if (!submission->transfer) {
+            return Errors::NotEnoughMemory;
+        }
+        submission->device = this;
+    }
+    submission->owner = &transfer;
+    if (transfer.endpoint == 0) {
+        auto& buffer = submission->controlBuffer;
+        buffer.resize(LIBUSB_CONTROL_SETUP_SIZE + transfer.length);
+        libusb_fill_control_setup(buffer.data(), transfer.setup.requestType, transfer.setup.request,
+                                  transfer.setup.value, transfer.setup.index, transfer.setup.length);
+        if (!transfer.IsIn()) {
+            std::copy_n(transfer.data, transfer.length, buffer.begin() + LIBUSB_CONTROL_SETUP_SIZE);
+        }
+        libusb_fill_control_transfer(submission->transfer, handle, buffer.data(), &LibUsbDevice::Completed,
+                                     submission.get(), 0);
+    } else {
+        libusb_fill_bulk_transfer(submission->transfer, handle, transfer.endpoint, transfer.data,
+                                  static_cast<int>(transfer.length), &LibUsbDevice::Completed,
+                                  submission.get(), 0);
+        if (transfer.endpoint == Protocol::InterruptInEndpoint) {
+            submission->transfer->type = LIBUSB_TRANSFER_TYPE_INTERRUPT;
+        }
+    }
+
+    const std::lock_guard lock(mutex);
+    running.reserve(running.size() + 1);
+    spare.reserve(spare.size() + running.size() + 1);
+    const int result = libusb_submit_transfer(submission->transfer);
+    if (result != LIBUSB_SUCCESS) {
+        spare.push_back(std::move(submission));
+        return ErrorFromLibUsb(result);
+    }
+    transfer.deviceData = submission.get();
+    running.push_back(submission.release());
+    return Errors::Success;
+}
+
+void LibUsbDevice::Cancel(Transfer& transfer) {
+    const std::lock_guard lock(mutex);
+    if (auto* submission = static_cast<Submission*>(transfer.deviceData)) {
+        libusb_cancel_transfer(submission->transfer);
+    }
+}
+
+void LibUsbDevice::Completed(libusb_transfer* transfer) {
+    auto& submission = *static_cast<Submission*>(transfer->user_data);
+    submission.device->Complete(submission);
+}
+
+void LibUsbDevice::Complete(Submission& submission) {
+    Transfer& transfer = *submission.owner;
+    const std::uint32_t moved = static_cast<std::uint32_t>(std::max(submission.transfer->actual_length, 0));
+    transfer.actualLength = std::min(moved, transfer.length);
+    transfer.status = StatusFromLibUsb(submission.transfer->status);
+    if (transfer.endpoint == 0 && transfer.IsIn()) {
+        std::copy_n(submission.controlBuffer.begin() + LIBUSB_CONTROL_SETUP_SIZE, transfer.actualLength,
+                    transfer.data);
+    }
+    {
+        const std::lock_guard lock(mutex);
+        transfer.deviceData = nullptr;
+        std::erase(running, &submission);
+        spare.push_back(std::unique_ptr<Submission>(&submission));
+        ++completing;
+    }
+    transfer.client->TransferCompleted(transfer);
+    const std::lock_guard lock(mutex);
+    --completing;
+    idle.notify_all();
+}
+
+}  // namespace
+
+std::shared_ptr<UsbDevice> OpenLibUsbDevice(const std::string& deviceNode, ErrorCode& error) {
+    const int file = open(deviceNode.c_str(), O_RDWR | O_CLOEXEC);
+    if (file < 0) {
+        switch (errno) {
+            case EACCES:
+            case EPERM:
+                error = Errors::AccessDenied;
+                break;
+            case ENOENT:
+            case ENODEV:
+                error = Errors::FileNotFound;
+                break;
+            default:
+                error = Errors::GeneralFailure;
+        }
+        return nullptr;
+    }
+    libusb_context* context = nullptr;
+    int result = libusb_init(&context);
+    if (result == LIBUSB_SUCCESS) {
+        libusb_device_handle* handle = nullptr;
+        result = libusb_wrap_sys_device(context, file, &handle);
+        if (result == LIBUSB_SUCCESS) {
+            error = Errors::Success;
+            return std::make_shared<LibUsbDevice>(file, context, handle);
+        }
+        libusb_exit(context);
+    }
+    close(file);
+    error = ErrorFromLibUsb(result);
+    return nullptr;
+}
+
+}  // namespace Varnholt::Platform::Usb

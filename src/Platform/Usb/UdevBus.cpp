@@ -1,0 +1,167 @@
+#include "Platform/Usb/UdevBus.h"
+
+#include <libudev.h>
+
+#include <algorithm>
+#include <charconv>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <memory>
+#include <set>
+#include <string_view>
+
+#include "Platform/Usb/LibUsbDevice.h"
+#include "Protocol/Instrument.h"
+
+namespace Varnholt::Platform::Usb {
+namespace {
+
+template <auto Release>
+struct ReleasedBy {
+    template <class T>
+    void operator()(T* object) const {
+        Release(object);
+    }
+};
+using Udev = std::unique_ptr<udev, ReleasedBy<udev_unref>>;
+using Enumeration = std::unique_ptr<udev_enumerate, ReleasedBy<udev_enumerate_unref>>;
+using Device = std::unique_ptr<udev_device, ReleasedBy<udev_device_unref>>;
+
+std::string Text(const char* text) {
+    return text ? text : "";
+}
+
+/// "1-1.10" behind "1-1.2": numbers compare as numbers.
+std::vector<unsigned> PortNumbers(std::string_view name) {
+    std::vector<unsigned> numbers;
+    const char* place = name.data();
+    const char* const end = place + name.size();
+    while (place != end) {
+        unsigned number = 0;
+        const auto [next, error] = std::from_chars(place, end, number);
+        if (error == std::errc()) {
+            numbers.push_back(number);
+            place = next;
+        } else {
+            ++place;
+        }
+    }
+    return numbers;
+}
+
+UsbDeviceInfo Describe(udev_device* device) {
+    UsbDeviceInfo info;
+    info.name = "usb-" + Text(udev_device_get_sysname(device));
+    info.deviceNode = Text(udev_device_get_devnode(device));
+    info.systemPath = Text(udev_device_get_syspath(device));
+    info.vendorId = Text(udev_device_get_sysattr_value(device, "idVendor"));
+    info.productId = Text(udev_device_get_sysattr_value(device, "idProduct"));
+    info.manufacturer = Text(udev_device_get_sysattr_value(device, "manufacturer"));
+    info.product = Text(udev_device_get_sysattr_value(device, "product"));
+    info.serial = Text(udev_device_get_sysattr_value(device, "serial"));
+    info.registered = udev_device_get_property_value(device, InterfaceClassProperty) != nullptr;
+
+    const std::string interfacePath =
+        info.systemPath + "/" + Text(udev_device_get_sysname(device)) + ":1.0/driver";
+    std::error_code error;
+    const auto driver = std::filesystem::read_symlink(interfacePath, error);
+    if (!error) {
+        info.kernelDriver = driver.filename();
+    }
+    return info;
+}
+
+std::vector<UsbDeviceInfo> ListDevices(bool registeredOnly) {
+    std::vector<UsbDeviceInfo> devices;
+    const Udev library(udev_new());
+    const Enumeration enumeration(library ? udev_enumerate_new(library.get()) : nullptr);
+    if (!enumeration) {
+        return devices;
+    }
+    udev_enumerate_add_match_subsystem(enumeration.get(), "usb");
+    if (registeredOnly) {
+        udev_enumerate_add_match_property(enumeration.get(), InterfaceClassProperty, "*");
+    } else {
+        udev_enumerate_add_match_property(enumeration.get(), "DEVTYPE", "usb_device");
+    }
+    udev_enumerate_scan_devices(enumeration.get());
+    udev_list_entry* entry = nullptr;
+    udev_list_entry_foreach(entry, udev_enumerate_get_list_entry(enumeration.get())) {
+        const Device device(udev_device_new_from_syspath(library.get(), udev_list_entry_get_name(entry)));
+        if (device && Text(udev_device_get_devtype(device.get())) == "usb_device") {
+            devices.push_back(Describe(device.get()));
+        }
+    }
+    std::ranges::sort(devices, {}, [](const UsbDeviceInfo& info) { return PortNumbers(info.name); });
+    return devices;
+}
+
+/// The endpoint addresses of the first interface, read from the descriptors that the kernel keeps.
+std::set<std::uint8_t> EndpointsOfFirstInterface(const std::string& systemPath) {
+    std::ifstream file(systemPath + "/descriptors", std::ios::binary);
+    const std::vector<std::uint8_t> bytes{std::istreambuf_iterator<char>(file), {}};
+    constexpr std::uint8_t interfaceDescriptor = 4;
+    constexpr std::uint8_t endpointDescriptor = 5;
+    std::set<std::uint8_t> endpoints;
+    bool inFirstInterface = false;
+    for (std::size_t place = 0; place + 2 <= bytes.size() && bytes[place] >= 2;) {
+        const std::size_t length = bytes[place];
+        const std::uint8_t type = bytes[place + 1];
+        if (place + length > bytes.size()) {
+            break;
+        }
+        if (type == interfaceDescriptor && length >= 4) {
+            inFirstInterface = bytes[place + 2] == 0 && bytes[place + 3] == 0;
+        } else if (type == endpointDescriptor && length >= 3 && inFirstInterface) {
+            endpoints.insert(bytes[place + 2]);
+        }
+        place += length;
+    }
+    return endpoints;
+}
+
+class UdevBus final : public UsbBus {
+  public:
+    std::vector<std::string> List() override {
+        std::vector<std::string> names;
+        for (const UsbDeviceInfo& device : ListRegisteredDevices()) {
+            names.push_back(device.name);
+        }
+        return names;
+    }
+
+    std::shared_ptr<UsbDevice> Open(const std::string& name, ErrorCode& error) override {
+        for (const UsbDeviceInfo& device : ListRegisteredDevices()) {
+            if (device.name == name) {
+                return OpenLibUsbDevice(device.deviceNode, error);
+            }
+        }
+        error = Errors::FileNotFound;
+        return nullptr;
+    }
+};
+
+}  // namespace
+
+std::vector<UsbDeviceInfo> ListRegisteredDevices() {
+    return ListDevices(true);
+}
+
+std::vector<UsbDeviceInfo> ListCandidateDevices() {
+    std::vector<UsbDeviceInfo> devices = ListDevices(false);
+    std::erase_if(devices, [](const UsbDeviceInfo& device) {
+        const auto endpoints = EndpointsOfFirstInterface(device.systemPath);
+        return !endpoints.contains(Protocol::BulkOutEndpoint) ||
+               !endpoints.contains(Protocol::BulkInEndpoint) ||
+               !endpoints.contains(Protocol::InterruptInEndpoint);
+    });
+    return devices;
+}
+
+UsbBus& RealUsbBus() {
+    static UdevBus bus;
+    return bus;
+}
+
+}  // namespace Varnholt::Platform::Usb

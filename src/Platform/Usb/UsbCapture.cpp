@@ -1,0 +1,71 @@
+#include "Platform/Usb/UsbCapture.h"
+
+#include <algorithm>
+
+#include "Platform/Usb/InterceptingDevice.h"
+#include "Protocol/DescribeTransfer.h"
+
+namespace Varnholt::Platform::Usb {
+namespace {
+
+std::string Comment(const Transfer& transfer, bool completion) {
+    constexpr std::uint8_t vendorType = 0x40;
+    if (transfer.endpoint != 0 || (transfer.setup.requestType & 0x60) != vendorType) {
+        return {};
+    }
+    const bool dataKnown = completion || !transfer.IsIn();
+    const std::uint32_t length = completion ? transfer.actualLength : transfer.length;
+    return Protocol::DescribeRequest(transfer.setup.request, transfer.setup.value,
+                                     {transfer.data, dataKnown ? length : 0});
+}
+
+class CapturedDevice final : public InterceptingDevice {
+  public:
+    CapturedDevice(std::shared_ptr<UsbDevice> recordedDevice, PcapngWriter& recorder, std::uint8_t number)
+        : InterceptingDevice(std::move(recordedDevice)), writer(recorder), deviceNumber(number) {}
+    ~CapturedDevice() override { Detach(); }
+
+  private:
+    void BeforeSubmit(std::uint64_t id, Transfer& transfer) override {
+        writer.Write({id, false, deviceNumber, &transfer, Comment(transfer, false)});
+    }
+    void AfterCompletion(std::uint64_t id, Transfer& transfer) noexcept override {
+        try {
+            writer.Write({id, true, deviceNumber, &transfer, Comment(transfer, true)});
+        } catch (...) {  // no memory for the packet: the traffic goes on unrecorded
+        }
+    }
+    void Refused(std::uint64_t id, Transfer& transfer, ErrorCode code) override {
+        transfer.status =
+            code == Errors::DeviceNotConnected ? TransferStatus::DeviceGone : TransferStatus::IoError;
+        transfer.actualLength = 0;
+        AfterCompletion(id, transfer);
+    }
+
+    PcapngWriter& writer;
+    const std::uint8_t deviceNumber;
+};
+
+}  // namespace
+
+std::shared_ptr<UsbDevice> CaptureDevice(std::shared_ptr<UsbDevice> device, PcapngWriter& writer,
+                                         std::uint8_t deviceNumber) {
+    return std::make_shared<CapturedDevice>(std::move(device), writer, deviceNumber);
+}
+
+std::shared_ptr<UsbDevice> CapturingBus::Open(const std::string& name, ErrorCode& error) {
+    constexpr std::uint8_t highestDeviceNumber = 127;
+    std::shared_ptr<UsbDevice> device = bus.Open(name, error);
+    if (!device) {
+        return nullptr;
+    }
+    const auto known = std::ranges::find(names, name);
+    const auto number = static_cast<std::size_t>(known - names.begin()) + 1;
+    if (known == names.end()) {
+        names.push_back(name);
+    }
+    return CaptureDevice(std::move(device), writer,
+                         static_cast<std::uint8_t>(std::min<std::size_t>(number, highestDeviceNumber)));
+}
+
+}  // namespace Varnholt::Platform::Usb
