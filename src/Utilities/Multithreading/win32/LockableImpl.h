@@ -11,8 +11,8 @@ namespace Varnholt::Utilities::Multithreading {
 
 /// The locking half of a lock that is a waitable object of the platform; unlocking is what the kinds differ
 /// in.
-template <class Base>
-class Win32Lockable : public Base {
+template <class T>
+class Win32Lockable : public T {
   public:
     /// Takes ownership of `newHandle`; `NoHandle` is refused with `InvalidArgumentException`.
     Win32Lockable(Platform::Handle newHandle, const std::string& objectName);
@@ -28,8 +28,8 @@ class Win32Lockable : public Base {
     std::string name;
 };
 
-template <class Base>
-Win32Lockable<Base>::Win32Lockable(Platform::Handle newHandle, const std::string& objectName) try
+template <class T>
+Win32Lockable<T>::Win32Lockable(Platform::Handle newHandle, const std::string& objectName) try
     : handle(newHandle), name(objectName) {
     if (!handle) {
         throw Exceptions::InvalidArgumentException("handle is NULL", Exceptions::Here());
@@ -37,8 +37,8 @@ Win32Lockable<Base>::Win32Lockable(Platform::Handle newHandle, const std::string
 }
 TRACED
 
-template <class Base>
-bool Win32Lockable<Base>::TryLock(int timeout) try {
+template <class T>
+bool Win32Lockable<T>::TryLock(int timeout) try {
     const std::uint32_t limit = timeout < 0 ? Platform::Infinite : static_cast<std::uint32_t>(timeout);
     switch (Platform::Wait(handle.Get(), limit)) {
         case Platform::WaitResult::Signalled:
