@@ -10,17 +10,27 @@ set(CMAKE_CXX_VISIBILITY_PRESET hidden)
 set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
 find_package(Threads REQUIRED)
 
+# Locations in exception traces begin with \src\ and do not depend on where the tree was checked out. A compiler cache
+# that rewrites paths hands the compiler relative ones. (Not a target's option: a list cannot hold texts that end with a
+# backslash.)
+file(RELATIVE_PATH OSTRA_SOURCE_FROM_BUILD "${PROJECT_BINARY_DIR}" "${PROJECT_SOURCE_DIR}/src")
+foreach(OSTRA_SOURCE_ROOT IN ITEMS "${PROJECT_SOURCE_DIR}/src" "${OSTRA_SOURCE_FROM_BUILD}")
+  string(APPEND CMAKE_CXX_FLAGS " '-fmacro-prefix-map=${OSTRA_SOURCE_ROOT}/=\\src\\'")
+endforeach()
+
 add_library(ostra_options INTERFACE)
 target_include_directories(ostra_options INTERFACE "${PROJECT_SOURCE_DIR}/src" "${PROJECT_SOURCE_DIR}/include")
 target_compile_options(ostra_options INTERFACE
   -Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion -Wshadow -Wcast-align -Wformat=2 -Werror
   $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor -Woverloaded-virtual -Wold-style-cast -Wextra-semi>
   -ffunction-sections -fdata-sections
-  "-fdebug-prefix-map=${PROJECT_SOURCE_DIR}/="
-  # Locations in exception traces begin with \src\ and do not depend on where the tree was checked out. (The empty
-  # expression keeps the last backslash from escaping the list's separator.)
-  "-fmacro-prefix-map=${PROJECT_SOURCE_DIR}/src/=\\src\\$<1:>")
+  "-fdebug-prefix-map=${PROJECT_SOURCE_DIR}/=")
 target_link_libraries(ostra_options INTERFACE Threads::Threads)
+if(WIN32)
+  # A program is one file: the compiler's run-time libraries are part of it. Nothing newer than Windows XP is used.
+  target_compile_definitions(ostra_options INTERFACE _WIN32_WINNT=0x0501 WIN32_LEAN_AND_MEAN NOMINMAX)
+  target_link_options(ostra_options INTERFACE -static -Wl,--gc-sections)
+endif()
 if(OSTRA_SANITIZE)
   target_compile_options(ostra_options INTERFACE -fsanitize=${OSTRA_SANITIZE} -fno-omit-frame-pointer -fno-sanitize-recover=all)
   target_link_options(ostra_options INTERFACE -fsanitize=${OSTRA_SANITIZE})
@@ -46,5 +56,5 @@ function(ostra_test NAME)
   ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest)
   target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
   add_test(NAME ${NAME} COMMAND ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:${NAME}>)
-  set_tests_properties(${NAME} PROPERTIES TIMEOUT 300)
+  set_tests_properties(${NAME} PROPERTIES TIMEOUT 300 SKIP_RETURN_CODE 77)
 endfunction()

@@ -1,0 +1,114 @@
+#include "Platform/DeviceFiles.h"
+
+#include <cstddef>
+
+#include "Platform/CallFilter.h"
+#include "Platform/Win32/SystemInterfaces.h"
+#include "Platform/Win32/Windows.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+// The records are handed to the system as they are.
+static_assert(sizeof(Overlapped) == sizeof(OVERLAPPED));
+static_assert(offsetof(Overlapped, internal) == offsetof(OVERLAPPED, Internal));
+static_assert(offsetof(Overlapped, internalHigh) == offsetof(OVERLAPPED, InternalHigh));
+static_assert(offsetof(Overlapped, offset) == offsetof(OVERLAPPED, Offset));
+static_assert(offsetof(Overlapped, offsetHigh) == offsetof(OVERLAPPED, OffsetHigh));
+static_assert(offsetof(Overlapped, event) == offsetof(OVERLAPPED, hEvent));
+
+OVERLAPPED* SystemRecord(Overlapped& record) {
+    return reinterpret_cast<OVERLAPPED*>(&record);
+}
+
+class WindowsDeviceFiles final : public DeviceFileSystem {
+  public:
+    std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override {
+        return ListSystemInterfaces(interfaceClass);
+    }
+
+    Handle Open(const std::string& path) override {
+        if (CallMustFail("Open")) {
+            return InvalidHandle();
+        }
+        return ::CreateFileA(path.c_str(), GENERIC_READ | GENERIC_WRITE, FILE_SHARE_READ | FILE_SHARE_WRITE,
+                             nullptr, OPEN_EXISTING, FILE_FLAG_OVERLAPPED, nullptr);
+    }
+
+    bool CloseFile(Handle file) override {
+        // A driver need not notice the close of a file while transfers of it are pending.
+        ::CancelIo(file);
+        return ::CloseHandle(file) != 0;
+    }
+
+    bool StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) override {
+        DWORD unused = 0;
+        return !CallMustFail("StartRead") &&
+               ::ReadFile(file, buffer, length, &unused, SystemRecord(record)) != 0;
+    }
+
+    bool StartWrite(Handle file, const void* buffer, std::uint32_t length, Overlapped& record) override {
+        DWORD unused = 0;
+        return !CallMustFail("StartWrite") &&
+               ::WriteFile(file, buffer, length, &unused, SystemRecord(record)) != 0;
+    }
+
+    bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
+                      void* output, std::uint32_t outputSize, Overlapped& record) override {
+        DWORD unused = 0;
+        // The input is only read; the system's declaration leaves that out.
+        return !CallMustFail("StartControl") &&
+               ::DeviceIoControl(file, code, const_cast<void*>(input), inputSize, output, outputSize, &unused,
+                                 SystemRecord(record)) != 0;
+    }
+
+    bool GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) override {
+        if (CallMustFail("GetResult")) {
+            return false;
+        }
+        if (wait) {
+            WaitForEnd(record);
+        }
+        DWORD moved = 0;
+        const bool succeeded = ::GetOverlappedResult(file, SystemRecord(record), &moved, FALSE) != 0;
+        transferred = moved;
+        return succeeded;
+    }
+
+    bool CancelTransfers(Handle file) override {
+        return !CallMustFail("CancelTransfers") && ::CancelIo(file) != 0;
+    }
+
+  private:
+    static bool HasEnded(Overlapped& record) {
+        const volatile ULONG_PTR& status = SystemRecord(record)->Internal;
+        return status != static_cast<ULONG_PTR>(STATUS_PENDING);
+    }
+
+    /// The record, not the event, tells the end of a transfer: two transfers can share an event, and a wait
+    /// elsewhere can have used up the signal. The event only shortens the wait. (The system's own waiting
+    /// form of `GetOverlappedResult` waits for the event alone, in these cases for ever.)
+    static void WaitForEnd(Overlapped& record) {
+        constexpr DWORD CheckInterval = 10;
+        bool tookSignalOfAnother = false;
+        while (!HasEnded(record)) {
+            if (record.event == NoHandle || tookSignalOfAnother) {
+                ::Sleep(1);
+            } else if (::WaitForSingleObject(record.event, CheckInterval) != WAIT_TIMEOUT) {
+                tookSignalOfAnother = !HasEnded(record);
+            }
+        }
+        if (tookSignalOfAnother) {
+            ::SetEvent(record.event);
+        }
+    }
+};
+
+}  // namespace
+
+DeviceFileSystem& SystemDeviceFiles() {
+    static WindowsDeviceFiles files;
+    return files;
+}
+
+}  // namespace Varnholt::Platform
