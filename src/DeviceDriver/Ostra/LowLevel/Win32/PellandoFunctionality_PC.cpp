@@ -1,0 +1,265 @@
+#include "DeviceDriver/Ostra/LowLevel/Win32/PellandoFunctionality_PC.h"
+
+#include <algorithm>
+#include <cstring>
+#include <span>
+#include <vector>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
+#include "DeviceDriver/Ostra/LowLevel/Win32/WaitLimit.h"
+#include "Platform/Threads.h"
+#include "Protocol/ByteOrder.h"
+#include "Utilities/Exceptions/Location.h"
+#include "Utilities/Exceptions/Trace.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+
+namespace NativeDriver = Protocol::NativeDriver;
+using Generic::Utilities::IOException;
+using Protocol::Request;
+using Varnholt::Utilities::Exceptions::Here;
+
+namespace {
+
+/// A strip read must have its next read queued in time: its thread goes before others while it runs.
+class RaisedPriority final {
+  public:
+    RaisedPriority() : before(Platform::CurrentThreadPriority()) {
+        Platform::SetCurrentThreadPriority(Platform::HighestThreadPriority);
+    }
+    ~RaisedPriority() { Platform::SetCurrentThreadPriority(before); }
+    RaisedPriority(const RaisedPriority&) = delete;
+    RaisedPriority& operator=(const RaisedPriority&) = delete;
+
+  private:
+    const int before;
+};
+
+std::uint32_t SecondsLimit(std::uint32_t seconds) {
+    return WaitLimit(std::uint64_t{seconds} * 1000);
+}
+
+}  // namespace
+
+PellandoFunctionality_PC::PellandoFunctionality_PC(Generic::EventListener* listener,
+                                                   std::uint32_t deviceIndex) try
+    : device(new PellandoUSBDevice(listener, GetDeviceAddress(deviceIndex))) {
+    record.block[NativeDriver::Block::Type] = NativeDriver::TypeVendor;
+    record.block[NativeDriver::Block::Request] = static_cast<std::uint8_t>(Request::Measure);
+}
+TRACED
+
+std::string PellandoFunctionality_PC::GetDeviceAddress(std::uint32_t deviceIndex) try {
+    const std::vector<std::string> paths = PellandoUSBDevice::GetAllDevices();
+    if (paths.empty()) {
+        throw IOException("No devices connected", Here());
+    }
+    if (deviceIndex >= paths.size()) {
+        throw IOException("No such device connected", Here());
+    }
+    return paths[deviceIndex];
+}
+TRACED
+
+void PellandoFunctionality_PC::Transfer(Request request, std::uint8_t direction, void* data,
+                                        std::uint32_t length) try {
+    record.block[NativeDriver::Block::Direction] = direction;
+    record.block[NativeDriver::Block::Request] = static_cast<std::uint8_t>(request);
+    device->PerformDeviceIOControl(record.block, data, length);
+}
+TRACED
+
+void PellandoFunctionality_PC::Send(Request request, std::uint32_t length) try {
+    Transfer(request, NativeDriver::DirectionOut, record.data.data(), length);
+}
+TRACED
+
+void PellandoFunctionality_PC::Receive(Request request, std::uint32_t length) try {
+    Transfer(request, NativeDriver::DirectionIn, record.data.data(), length);
+}
+TRACED
+
+template <std::size_t Size>
+void PellandoFunctionality_PC::Put(std::size_t offset, const std::array<std::uint8_t, Size>& bytes) {
+    std::copy(bytes.begin(), bytes.end(), record.data.begin() + static_cast<std::ptrdiff_t>(offset));
+}
+
+template <std::size_t Size>
+void PellandoFunctionality_PC::Take(std::size_t offset, std::array<std::uint8_t, Size>& bytes) const {
+    std::copy_n(record.data.begin() + static_cast<std::ptrdiff_t>(offset), Size, bytes.begin());
+}
+
+void PellandoFunctionality_PC::RemoveListener(Generic::EventListener* listener) try {
+    device->RemoveListener(listener);
+}
+TRACED
+
+void PellandoFunctionality_PC::StartScan(std::uint32_t recordSize, std::uint32_t timeoutSeconds,
+                                         std::uint32_t total) try {
+    scanRecords.clear();
+    Send(Request::Measure, 0);
+    try {
+        ReadStrip(recordSize, SecondsLimit(timeoutSeconds), total);
+    } catch (...) {
+        scanRecords.clear();
+        throw;
+    }
+}
+TRACED
+
+void PellandoFunctionality_PC::ReadStrip(std::uint32_t recordSize, std::uint32_t timeout,
+                                         std::uint32_t total) try {
+    const RaisedPriority raised;
+    if (total != 0) {
+        device->ReadDataCountedStrip(scanRecords, recordSize, timeout, total);
+    } else {
+        device->ReadDataStrip(scanRecords, recordSize, timeout);
+    }
+}
+TRACED
+
+void PellandoFunctionality_PC::GetScanData(std::uint8_t* buffer, std::uint32_t* size) try {
+    if (scanRecords.empty()) {
+        *size = 0;
+        return;
+    }
+    const std::span<const std::uint8_t> bytes = scanRecords.front().Bytes();
+    *size = std::min(*size, static_cast<std::uint32_t>(bytes.size()));
+    std::memcpy(buffer, bytes.data(), *size);
+    scanRecords.pop_front();
+}
+TRACED
+
+void PellandoFunctionality_PC::MeasureRequest(std::uint8_t* buffer, std::uint32_t length,
+                                              std::uint32_t timeoutSeconds) try {
+    Send(Request::Measure, 0);
+    device->ReadData(buffer, length, SecondsLimit(timeoutSeconds));
+}
+TRACED
+
+void PellandoFunctionality_PC::SetMeasureParameters(const Bytes2& p1, const Bytes2& p2, const Bytes2& p3,
+                                                    std::uint8_t p4) try {
+    Put(0, p1);
+    Put(2, p2);
+    Put(4, p3);
+    record.data[6] = p4;
+    Send(Request::SetMeasureParameters, 8);
+}
+TRACED
+
+void PellandoFunctionality_PC::GetMeasureParameters(Bytes2& p1, Bytes2& p2, Bytes2& p3, std::uint8_t& p4,
+                                                    std::uint8_t& p5) try {
+    Receive(Request::GetMeasureParameters, 8);
+    Take(0, p1);
+    Take(2, p2);
+    Take(4, p3);
+    p4 = record.data[6];
+    p5 = record.data[7];
+}
+TRACED
+
+void PellandoFunctionality_PC::SetMeasureMode(std::uint8_t mode) try {
+    record.data[0] = mode;
+    Send(Request::SetMeasureMode, 1);
+}
+TRACED
+
+void PellandoFunctionality_PC::GetMeasureMode(std::uint8_t& m1, std::uint8_t& m2, std::uint8_t& m3,
+                                              std::uint8_t& m4, std::uint8_t& m5, std::uint8_t& m6) try {
+    Receive(Request::GetMeasureMode, 6);
+    m1 = record.data[0];
+    m2 = record.data[1];
+    m3 = record.data[2];
+    m4 = record.data[3];
+    m5 = record.data[4];
+    m6 = record.data[5];
+}
+TRACED
+
+void PellandoFunctionality_PC::WriteEEPROM(const Bytes4& address, const Bytes2& length,
+                                           const std::uint8_t* data, std::uint32_t count) try {
+    WriteEEPROM(Request::WriteEeprom, address, length, data, count);
+}
+TRACED
+
+void PellandoFunctionality_PC::WriteEEPROM(Request request, const Bytes4& address, const Bytes2& length,
+                                           const std::uint8_t* data, std::uint32_t count) try {
+    Put(0, address);
+    Put(4, length);
+    Send(request, 8);
+    device->WriteData(data, count, WaitLimit(std::uint64_t{count} * 10));
+    const std::uint8_t end = 0x00;
+    device->WriteData(&end, sizeof end, 0);
+    device->WriteData(&end, sizeof end, 0);
+}
+TRACED
+
+void PellandoFunctionality_PC::ReadEEPROM(const Bytes4& address, const Bytes2& length, std::uint8_t* data,
+                                          std::uint32_t count) try {
+    Put(0, address);
+    Put(4, length);
+    Send(Request::ReadEeprom, 8);
+    device->ReadData(data, count, WaitLimit(count));
+}
+TRACED
+
+void PellandoFunctionality_PC::WriteCPLD(const Bytes2& c1, const Bytes2& c2, const Bytes2& c3) try {
+    Put(0, c1);
+    Put(2, c2);
+    Put(4, c3);
+    Send(Request::WriteCpld, 6);
+}
+TRACED
+
+void PellandoFunctionality_PC::ReadCPLD(Bytes2& value) try {
+    Receive(Request::ReadCpld, 2);
+    Take(0, value);
+}
+TRACED
+
+void PellandoFunctionality_PC::DownloadRAMFirmware(std::uint16_t address, const std::uint8_t* image,
+                                                   std::uint32_t count) try {
+    Protocol::StoreLittle16(&record.block[NativeDriver::Block::Value], address);
+    // The driver only reads the data of a request in this direction.
+    Transfer(Request::DownloadRamFirmware, NativeDriver::DirectionOut, const_cast<std::uint8_t*>(image),
+             count);
+}
+TRACED
+
+void PellandoFunctionality_PC::DownloadEEPROMFirmware(const Bytes4& address, const Bytes2& length,
+                                                      const std::uint8_t* image, std::uint32_t count) try {
+    WriteEEPROM(Request::DownloadEepromFirmware, address, length, image, count);
+}
+TRACED
+
+void PellandoFunctionality_PC::GetMISC(std::uint8_t& m1, Bytes2& m2, std::uint8_t& m3, Bytes2& m4,
+                                       Bytes2& m5) try {
+    Receive(Request::GetMisc, 8);
+    Take(0, m2);
+    Take(2, m4);
+    Take(4, m5);
+    m1 = record.data[6];
+    m3 = record.data[7];
+}
+TRACED
+
+void PellandoFunctionality_PC::GetChipID(std::uint8_t* id) try {
+    Transfer(Request::GetChipId, NativeDriver::DirectionIn, id, 8);
+}
+TRACED
+
+void PellandoFunctionality_PC::Reset(const Bytes2& code) try {
+    // The code's low byte; the second byte of the data area gets it as well and is not sent.
+    record.data[0] = code[1];
+    record.data[1] = code[1];
+    Send(Request::Reset, 1);
+}
+TRACED
+
+void PellandoFunctionality_PC::GetDeviceIdentifier(std::string& identifier) try {
+    identifier = device->GetAddress();
+}
+TRACED
+
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -1,0 +1,303 @@
+#include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <iterator>
+#include <span>
+#include <utility>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/Win32/NativeDeviceList.h"
+#include "DeviceDriver/Ostra/LowLevel/Win32/StripReader.h"
+#include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
+#include "DeviceDriver/Ostra/LowLevel/Win32/WaitLimit.h"
+#include "Platform/Time.h"
+#include "Platform/WaitableObjects.h"
+#include "Protocol/ByteOrder.h"
+#include "Protocol/Instrument.h"
+#include "Utilities/Exceptions/Location.h"
+#include "Utilities/Exceptions/Trace.h"
+#include "Utilities/Multithreading/Mutex.h"
+#include "Utilities/Multithreading/ScopedLock.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+
+namespace NativeDriver = Protocol::NativeDriver;
+using Generic::EventListener;
+using Generic::Utilities::IOException;
+using Generic::Utilities::TimeoutException;
+using Platform::WaitResult;
+using Varnholt::Utilities::Exceptions::Here;
+using Varnholt::Utilities::Multithreading::Mutex;
+using Varnholt::Utilities::Multithreading::ScopedLock;
+
+namespace {
+
+constexpr std::uint32_t MaximumDevices = 127;
+constexpr std::uint32_t RecordsPerChunk = 10;
+constexpr std::uint32_t RecordsOfFirstRead = 2;
+constexpr std::uint32_t MaximumChunk = 65535;
+constexpr std::uint32_t StripGrace = 3000;  ///< what a read of a strip gets beyond its time-out
+
+NativeDriver::ControlBlock MakeBlock(std::uint8_t type, std::uint8_t request, std::uint16_t value) {
+    NativeDriver::ControlBlock block{};
+    block[NativeDriver::Block::Direction] = NativeDriver::DirectionOut;
+    block[NativeDriver::Block::Type] = type;
+    block[NativeDriver::Block::Request] = request;
+    Protocol::StoreLittle16(&block[NativeDriver::Block::Value], value);
+    return block;
+}
+
+std::uint32_t ChunkSize(std::uint32_t recordSize) {
+    if (recordSize > MaximumChunk / RecordsPerChunk) {
+        throw IOException("Max packages size is 65535", Here());
+    }
+    if (recordSize == 0) {
+        throw IOException("Record size must not be 0", Here());
+    }
+    return recordSize * RecordsPerChunk;
+}
+
+void AppendRecords(ScanRecordList& records, std::span<const std::uint8_t> data, std::size_t recordSize) {
+    for (; data.size() >= recordSize; data = data.subspan(recordSize)) {
+        records.emplace_back(data.first(recordSize));
+    }
+}
+
+}  // namespace
+
+/// What a message needs. The listener's thread shares the ownership while it delivers one, because the device
+/// may be closed from inside that message, and because a thread that waits for the device lock cannot be
+/// ended everywhere.
+class PellandoUSBDevice::Core final : public EventListener {
+  public:
+    Core(EventListener* messageListener, const std::string& devicePath)
+        : lock(StripStrangeChars(devicePath)),
+          path(devicePath),
+          listener(messageListener),
+          control(path, NativeDriver::ControlPipe, Platform::NoHandle),
+          read(path, NativeDriver::ReadPipe, Platform::NoHandle),
+          write(path, NativeDriver::WritePipe, Platform::NoHandle) {}
+
+    void MessageFromDevice(std::uint32_t code, std::uint32_t parameter) override {
+        const ScopedLock held(lock);
+        if (!listener || isClosed) {
+            return;
+        }
+        listener->MessageFromDevice(code, parameter);
+        if (code == Generic::MessageDeviceGone) {
+            const Platform::CriticalSection::Holder closing(closingLock);
+            ClosePipes();
+        }
+    }
+
+    void ClosePipes() {
+        write.Close();
+        read.Close();
+        control.Close();
+    }
+
+    Mutex lock;  ///< the device lock
+    const std::string path;
+    EventListener* listener;  ///< guarded by `lock`
+    USBConnection control;
+    USBConnection read;
+    USBConnection write;
+    /// Keeps the pipes open for the controls that are sent without the device lock.
+    Platform::CriticalSection closingLock;
+    std::atomic<bool> isClosed = false;
+};
+
+PellandoUSBDevice::PellandoUSBDevice(EventListener* listener, const std::string& devicePath) try
+    : core(std::make_shared<Core>(listener, devicePath)), interruptListener(devicePath) {
+    const ScopedLock held(core->lock);
+    SetupInterruptListener();
+}
+TRACED
+
+PellandoUSBDevice::~PellandoUSBDevice() {
+    try {
+        Shutdown();
+    } catch (...) {  // the listener's own end stops its thread
+    }
+    core->isClosed = true;
+    core->ClosePipes();
+}
+
+void PellandoUSBDevice::SetupInterruptListener() try {
+    interruptListener.SetListener(core);
+    interruptListener.Start();
+}
+TRACED
+
+void PellandoUSBDevice::Shutdown() try {
+    HandleUntouchedButton();
+    interruptListener.Stop();
+}
+TRACED
+
+/// Without the device lock, which somebody may hold for the length of a scan. Failures do not matter: the
+/// instrument may be gone.
+void PellandoUSBDevice::HandleUntouchedButton() try {
+    if (interruptListener.IsTouched()) {
+        return;
+    }
+    const NativeDriver::ControlBlock abortPipe = MakeBlock(0, 0, Protocol::InterruptInEndpoint);
+    const NativeDriver::ControlBlock buttonReport =
+        MakeBlock(NativeDriver::TypeVendor, static_cast<std::uint8_t>(Protocol::Request::ButtonReport), 3);
+    std::array<std::uint8_t, 8> data{};
+    const auto length = static_cast<std::uint32_t>(data.size());
+    const Platform::CriticalSection::Holder open(core->closingLock);
+    core->control.PerformDeviceIOControl(abortPipe, NativeDriver::ControlAbortPipe, data.data(), length,
+                                         false);
+    core->control.PerformDeviceIOControl(buttonReport, NativeDriver::ControlButtonReport, data.data(), length,
+                                         false);
+}
+TRACED
+
+void PellandoUSBDevice::RemoveListener(EventListener*) try {
+    const ScopedLock held(core->lock);
+    core->listener = nullptr;
+    interruptListener.ClearListener();
+}
+TRACED
+
+void PellandoUSBDevice::MessageFromDevice(std::uint32_t code, std::uint32_t parameter) try {
+    const std::shared_ptr<Core> alive = core;  // the message may close the device
+    alive->MessageFromDevice(code, parameter);
+}
+TRACED
+
+void PellandoUSBDevice::PerformDeviceIOControl(const NativeDriver::ControlBlock& block, void* data,
+                                               std::uint32_t length) try {
+    const ScopedLock held(core->lock);
+    core->control.PerformDeviceIOControl(block, NativeDriver::ControlVendorRequest, data, length, true);
+}
+TRACED
+
+void PellandoUSBDevice::ReadData(void* buffer, std::uint32_t length, std::uint32_t timeout) try {
+    const ScopedLock held(core->lock);
+    core->read.Read(buffer, length, timeout);
+}
+TRACED
+
+void PellandoUSBDevice::WriteData(const void* buffer, std::uint32_t length, std::uint32_t timeout) try {
+    const ScopedLock held(core->lock);
+    core->write.Write(buffer, length, timeout);
+}
+TRACED
+
+void PellandoUSBDevice::ReadDataStrip(ScanRecordList& records, std::uint32_t recordSize,
+                                      std::uint32_t timeout) try {
+    const ScopedLock held(core->lock);
+    const std::uint32_t chunk = ChunkSize(recordSize);
+    const std::uint32_t limit = WaitLimit(timeout, StripGrace);
+    StripReader reader(core->read, chunk);
+    reader.Start(RecordsOfFirstRead * recordSize);
+    reader.Advance();
+    bool isFirst = true;
+    for (bool hasEnded = false;;) {
+        reader.Start(chunk);
+        AppendRecords(records, reader.Arrived(), recordSize);
+        if (hasEnded) {
+            return;
+        }
+        const WaitResult waited = reader.Await(limit);
+        if (waited == WaitResult::Abandoned) {
+            throw TimeoutException("Read data failed (Abandoned)", Here());
+        }
+        if (std::exchange(isFirst, false)) {
+            Platform::Beep(2140, 75);
+        }
+        if (!reader.HasSucceeded()) {
+            throw IOException("Read data failed (OverlappedRead)", Here());
+        }
+        if (reader.Count() % recordSize != 0) {
+            throw IOException("Read data failed (wrong data size)", Here());
+        }
+        hasEnded = reader.Count() != reader.SizeAsked();
+        reader.Advance();
+    }
+}
+TRACED
+
+void PellandoUSBDevice::ReadDataCountedStrip(ScanRecordList& records, std::uint32_t recordSize,
+                                             std::uint32_t timeout, std::uint32_t total) try {
+    const ScopedLock held(core->lock);
+    const std::uint32_t chunk = ChunkSize(recordSize);
+    const std::uint32_t limit = WaitLimit(timeout, StripGrace);
+    std::uint32_t remaining = total;
+    const auto takeNext = [&] {
+        const std::uint32_t size = std::min(chunk, remaining);
+        remaining -= size;
+        return size;
+    };
+    StripReader reader(core->read, chunk);
+    std::uint32_t current = takeNext();
+    if (current > 0) {
+        reader.Start(current);
+        reader.Advance();
+    }
+    for (;;) {
+        const std::uint32_t next = takeNext();
+        if (next > 0) {
+            reader.Start(next);
+        }
+        AppendRecords(records, reader.Arrived(), recordSize);
+        if (current == 0) {
+            return;
+        }
+        if (reader.Await(limit) == WaitResult::Abandoned) {
+            throw TimeoutException("system busy. try again. Read data failed (Abandoned - remaining: " +
+                                       std::to_string(remaining) + " total: " + std::to_string(total) + ")",
+                                   Here());
+        }
+        const auto state = [&] {
+            return " - read: " + std::to_string(reader.Count()) + ", expected: " + std::to_string(current) +
+                   ", remaining: " + std::to_string(remaining) + ")";
+        };
+        if (!reader.HasSucceeded()) {
+            throw IOException("system busy. try again. Read data failed (OverlappedRead" + state(), Here());
+        }
+        if (reader.Count() != current) {
+            throw IOException("system busy. try again. Read data failed (wrong data size" + state(), Here());
+        }
+        reader.Advance();
+        current = next;
+    }
+}
+TRACED
+
+const std::string& PellandoUSBDevice::GetAddress() const {
+    return core->path;
+}
+
+std::vector<std::string> PellandoUSBDevice::GetAllDevices() try {
+    std::vector<std::string> paths;
+    while (paths.size() < MaximumDevices) {
+        std::string path = ScanDevice(static_cast<std::uint16_t>(paths.size()));
+        if (path.empty()) {
+            break;
+        }
+        paths.push_back(std::move(path));
+    }
+    return paths;
+}
+TRACED
+
+std::string PellandoUSBDevice::ScanDevice(std::uint16_t index) try {
+    return NativeDeviceList().PathAt(index);
+}
+TRACED
+
+std::string PellandoUSBDevice::StripStrangeChars(const std::string& text) try {
+    std::string kept;
+    std::copy_if(text.begin(), text.end(), std::back_inserter(kept), [](char c) {
+        return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z');
+    });
+    return kept;
+}
+TRACED
+
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

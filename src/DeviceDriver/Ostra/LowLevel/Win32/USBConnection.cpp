@@ -1,0 +1,153 @@
+#include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/Win32/WaitLimit.h"
+#include "Platform/DeviceFiles.h"
+#include "Platform/Threads.h"
+#include "Platform/WaitableObjects.h"
+#include "Utilities/Exceptions/Location.h"
+#include "Utilities/Exceptions/Trace.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+namespace {
+
+using Generic::Utilities::IOException;
+using Generic::Utilities::TimeoutException;
+using Platform::NoHandle;
+using Platform::OverlappedRequest;
+using Platform::WaitResult;
+using Varnholt::Utilities::Exceptions::Here;
+
+constexpr std::uint32_t ControlWaitLimit = 2000;
+constexpr std::uint32_t TransferGrace = 5000;  ///< what a transfer gets beyond its time-out
+
+}  // namespace
+
+USBConnection::USBConnection(const std::string& path, std::uint32_t pipe, Platform::Handle event) try
+    : pipeNumber(pipe), sharedEvent(event == Platform::InvalidHandle() ? NoHandle : event), devicePath(path) {
+    OpenConnection();
+}
+TRACED
+
+USBConnection::~USBConnection() {
+    Close();
+}
+
+void USBConnection::OpenConnection() try {
+    const std::string suffix = pipeNumber == Protocol::NativeDriver::ControlPipe
+                                   ? std::string()
+                                   : Protocol::NativeDriver::PipeSuffix + std::to_string(pipeNumber);
+    pipeHandle = OpenPipe(devicePath + suffix);
+    if (sharedEvent != NoHandle) {
+        return;
+    }
+    ownEvent = Platform::MakeAutoResetEvent();
+    if (ownEvent == NoHandle) {
+        Close();
+        throw IOException("could not create pipe-event-handle", Here());
+    }
+}
+TRACED
+
+Platform::Handle USBConnection::OpenPipe(const std::string& name) try {
+    const Platform::Handle opened = Platform::DeviceFiles().Open(name);
+    if (opened == Platform::InvalidHandle()) {
+        const std::string error = GetErrorText();
+        throw IOException("could not open pipe:" + error, Here());
+    }
+    return opened;
+}
+TRACED
+
+void USBConnection::Close() noexcept {
+    // The pipe first: a transfer that this ends still signals the event.
+    if (const Platform::Handle file = pipeHandle.exchange(NoHandle); file != NoHandle) {
+        Platform::DeviceFiles().CloseFile(file);
+    }
+    if (const Platform::Handle event = ownEvent.exchange(NoHandle); event != NoHandle) {
+        Platform::Close(event);
+    }
+}
+
+void USBConnection::PerformDeviceIOControl(const Protocol::NativeDriver::ControlBlock& block,
+                                           std::uint32_t code, void* data, std::uint32_t length,
+                                           bool reportFailures) try {
+    Platform::SleepMilliseconds(1);
+    OverlappedRequest request(CompletionEvent());
+    request.StartControl(pipeHandle, code, block.data(), static_cast<std::uint32_t>(block.size()), data,
+                         length);
+    const WaitResult waited = Platform::Wait(request.CompletionEvent(), ControlWaitLimit);
+    if (!reportFailures) {
+        return;
+    }
+    if (waited != WaitResult::Signalled) {
+        const std::string error = GetErrorText();
+        throw TimeoutException("Device IO control failed " + error, Here());
+    }
+    std::uint32_t transferred = 0;
+    if (!request.GetResult(transferred)) {
+        const std::string error = GetErrorText();
+        throw IOException("Device IO control failed: " + error, Here());
+    }
+}
+TRACED
+
+void USBConnection::Read(void* buffer, std::uint32_t length, std::uint32_t timeout) try {
+    OverlappedRequest request(CompletionEvent());
+    request.StartRead(pipeHandle, buffer, length);
+    CompleteOverlappedIO(request, length, timeout, "read");
+}
+TRACED
+
+void USBConnection::Write(const void* buffer, std::uint32_t length, std::uint32_t timeout) try {
+    OverlappedRequest request(CompletionEvent());
+    request.StartWrite(pipeHandle, buffer, length);
+    CompleteOverlappedIO(request, length, timeout, "write");
+}
+TRACED
+
+std::uint32_t USBConnection::Read(std::vector<std::uint8_t>& buffer) try {
+    OverlappedRequest request(CompletionEvent());
+    request.StartRead(pipeHandle, buffer.data(), static_cast<std::uint32_t>(buffer.size()));
+    if (!request.IsRunning()) {
+        return 0;  // nothing would ever end the wait: not only when the access was denied
+    }
+    if (Platform::Wait(request.CompletionEvent(), Platform::Infinite) != WaitResult::Signalled) {
+        throw IOException("wait failed", Here());
+    }
+    std::uint32_t transferred = 0;
+    if (!request.GetResult(transferred) && request.IsRunning()) {
+        // Data that arrive while the read is being cancelled count.
+        transferred = request.CancelAndWait();
+    }
+    return transferred;
+}
+TRACED
+
+/// Leaves a transfer that still runs to the request, whose end cancels it and waits for that; by then the
+/// text of the failure is made.
+void USBConnection::CompleteOverlappedIO(OverlappedRequest& request, std::uint32_t expected,
+                                         std::uint32_t timeout, const std::string& name) try {
+    if (Platform::Wait(request.CompletionEvent(), WaitLimit(timeout, TransferGrace)) ==
+        WaitResult::Abandoned) {
+        const std::string error = GetErrorText();
+        throw TimeoutException(name + " data failed (wait abandoned)" + error, Here());
+    }
+    std::uint32_t transferred = 0;
+    if (!request.GetResult(transferred)) {
+        const std::string error = GetErrorText();
+        throw IOException(name + " data failed" + error, Here());
+    }
+    if (transferred != expected) {
+        throw IOException(name + " data failed (Not enough data)", Here());
+    }
+}
+TRACED
+
+std::string USBConnection::GetErrorText() try {
+    const Platform::ErrorCode code = Platform::LastError();
+    return " (Win32 Error (" + std::to_string(code) + ") : " + Platform::ErrorText(code) + ")";
+}
+TRACED
+
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel
