@@ -1,0 +1,177 @@
+#include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
+
+#include <algorithm>
+#include <array>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "Utilities/Exceptions/Trace.h"
+#include "Utilities/Tools/LexicalCast.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+
+using namespace Generic::Configuration;
+using Generic::Utilities::DataException;
+using Varnholt::Utilities::Exceptions::Here;
+using Varnholt::Utilities::Tools::lexical_cast;
+
+namespace {
+
+// Categories, as bits.
+constexpr unsigned Calibration = 1U << 0;
+constexpr unsigned Log = 1U << 1;
+constexpr unsigned Misc = 1U << 2;
+constexpr unsigned Special = 1U << 3;
+constexpr unsigned Measure = 1U << 4;
+constexpr unsigned Reset = 1U << 5;
+constexpr unsigned Cpld = 1U << 6;
+constexpr unsigned FirmwareDownload = 1U << 7;
+constexpr unsigned ModeDependent = 1U << 8;
+constexpr unsigned None = 0;
+
+struct Identifier {
+    std::uint16_t id;
+    unsigned categories;
+    PropertyType type;    ///< `TypeNone`: no default
+    std::uint16_t count;  ///< elements of the default
+};
+
+constexpr std::array Identifiers{
+    Identifier{1000, Calibration, TypeFloatVector, 2},
+    Identifier{1001, Calibration, TypeFloatVector, 2},
+    Identifier{1002, Calibration, TypeLongVector, 2},
+    Identifier{1003, Calibration, TypeLongVector, 2},
+    Identifier{1004, Calibration, TypeFloatVector, 2},
+    Identifier{1100, Calibration, TypeFloatVector, 2},
+    Identifier{1101, Calibration, TypeFloatVector, 2},
+    Identifier{1102, Calibration, TypeFloatVector, 2},
+    Identifier{1204, Calibration, TypeLong, 1},
+    Identifier{1205, Calibration, TypeLong, 1},
+    Identifier{1207, Calibration, TypeLong, 1},
+    Identifier{1208, Calibration, TypeLong, 1},
+    Identifier{1211, Calibration, TypeLong, 1},
+    Identifier{1212, Calibration, TypeLong, 1},
+    Identifier{1213, Calibration, TypeFloat, 1},
+    Identifier{1221, Calibration, TypeFloat, 1},
+    Identifier{1222, Calibration, TypeFloat, 1},
+    Identifier{2000, Measure | ModeDependent, TypeLong, 1},
+    Identifier{2001, Measure | ModeDependent, TypeFloat, 1},
+    Identifier{2002, Measure | ModeDependent, TypeLong, 1},
+    Identifier{2003, Measure | ModeDependent, TypeLong, 1},
+    Identifier{2004, Misc, TypeLong, 1},
+    Identifier{2005, None, TypeLong, 1},
+    Identifier{2006, Misc, TypeLong, 1},
+    Identifier{2007, Reset, TypeLong, 1},
+    Identifier{2008, Measure | ModeDependent, TypeLong, 1},
+    Identifier{2009, Measure | ModeDependent, TypeFloat, 1},
+    Identifier{2010, Measure | ModeDependent, TypeLong, 1},
+    Identifier{2011, ModeDependent, TypeLong, 1},
+    Identifier{2012, Misc, TypeLong, 1},
+    Identifier{2013, Misc, TypeLong, 1},
+    Identifier{2014, ModeDependent, TypeLong, 1},
+    Identifier{2015, ModeDependent, TypeLong, 1},
+    Identifier{2016, Misc, TypeFloat, 1},
+    Identifier{2017, Misc, TypeFloat, 1},
+    Identifier{2020, Misc, TypeLong, 1},
+    Identifier{2021, Measure | ModeDependent, TypeLong, 1},
+    Identifier{3001, Calibration, TypeLong, 1},
+    Identifier{3002, Calibration, TypeLong, 1},
+    Identifier{3007, Calibration, TypeLong, 1},
+    Identifier{3008, Calibration, TypeLong, 1},
+    Identifier{3009, Calibration | Special, TypeLongVector, 2},
+    Identifier{3010, Calibration | Special, TypeLong, 1},
+    Identifier{3011, Calibration, TypeLong, 1},
+    Identifier{3012, Calibration, TypeLong, 1},
+    Identifier{3013, Calibration, TypeLong, 1},
+    Identifier{3014, Calibration, TypeFloat, 1},
+    Identifier{4000, Calibration, TypeLong, 1},
+    Identifier{10000, Log, TypeLong, 1},
+    Identifier{10001, Log, TypeFloat, 1},
+    Identifier{10002, Log, TypeLong, 1},
+    Identifier{10003, Log, TypeLong, 1},
+    Identifier{10004, Log, TypeFloat, 1},
+    Identifier{10005, Log, TypeLong, 1},
+    Identifier{10010, Log, TypeLongVector, 128},
+    Identifier{10011, Log, TypeLongVector, 128},
+    Identifier{10012, Log, TypeLong, 1},
+    Identifier{10013, Log, TypeFloat, 1},
+    Identifier{10020, Log, TypeLong, 1},
+    Identifier{10021, Log, TypeLong, 1},
+    Identifier{20000, Cpld, TypeLong, 1},
+    Identifier{20001, None, TypeLong, 1},
+    Identifier{20002, None, TypeLong, 1},
+    Identifier{20003, FirmwareDownload, TypeNone, 0},
+};
+static_assert(std::ranges::is_sorted(Identifiers, {}, &Identifier::id));
+
+const Identifier* Find(std::uint16_t id) {
+    const auto* const found = std::ranges::lower_bound(Identifiers, id, {}, &Identifier::id);
+    return found != Identifiers.end() && found->id == id ? found : nullptr;
+}
+
+bool Belongs(std::uint16_t id, unsigned category) {
+    const Identifier* const known = Find(id);
+    return known && (known->categories & category) != 0;
+}
+
+}  // namespace
+
+bool ConfigurationDataConverter::IsCalibrationParameter(std::uint16_t id) {
+    return Belongs(id, Calibration);
+}
+bool ConfigurationDataConverter::IsLogParameter(std::uint16_t id) {
+    return Belongs(id, Log);
+}
+bool ConfigurationDataConverter::IsMiscParameter(std::uint16_t id) {
+    return Belongs(id, Misc);
+}
+bool ConfigurationDataConverter::IsSpecialParameter(std::uint16_t id) {
+    return Belongs(id, Special);
+}
+bool ConfigurationDataConverter::IsMeasureParameter(std::uint16_t id) {
+    return Belongs(id, Measure);
+}
+bool ConfigurationDataConverter::IsResetParameter(std::uint16_t id) {
+    return Belongs(id, Reset);
+}
+bool ConfigurationDataConverter::IsCPLDParameter(std::uint16_t id) {
+    return Belongs(id, Cpld);
+}
+bool ConfigurationDataConverter::IsFirmwareDownloadParameter(std::uint16_t id) {
+    return Belongs(id, FirmwareDownload);
+}
+bool ConfigurationDataConverter::IsModeDependent(std::uint16_t id) {
+    return Belongs(id, ModeDependent);
+}
+
+Property ConfigurationDataConverter::GetDefaultProperty(std::uint16_t id) try {
+    if (const Identifier* const known = Find(id)) {
+        switch (known->type) {
+            case TypeLong:
+                return Property(std::int32_t{0});
+            case TypeLongVector:
+                return Property(std::vector<std::int32_t>(known->count));
+            case TypeFloat:
+                return Property(0.0F);
+            case TypeFloatVector:
+                return Property(std::vector<float>(known->count));
+            case TypeNone:
+                break;
+        }
+    }
+    throw DataException("invalid property id " + lexical_cast<std::string>(id), Here());
+}
+TRACED
+
+void ConfigurationDataConverter::ByteArrayToConfigurationDataEntry(const std::vector<std::uint8_t>& bytes,
+                                                                   Property& entry) try {
+    entry.Assign(bytes, true);
+}
+TRACED
+
+void ConfigurationDataConverter::ConfigurationDataEntryToByteArray(const Property& entry,
+                                                                   std::vector<std::uint8_t>& bytes) try {
+    bytes = entry.AsByteVector(true);
+}
+TRACED
+
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -1,0 +1,281 @@
+#include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <exception>
+#include <utility>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
+#include "DeviceDriver/Ostra/LowLevel/SectionReader.h"
+#include "Protocol/EepromMap.h"
+#include "Protocol/PropertyIdentifiers.h"
+#include "Utilities/Exceptions/Trace.h"
+#include "Utilities/Tools/LexicalCast.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+
+namespace EepromMap = Protocol::EepromMap;
+namespace PropertyIds = Protocol::PropertyIds;
+using namespace Generic::Configuration;
+using Generic::Utilities::DataException;
+using Varnholt::Utilities::Exceptions::Here;
+using Varnholt::Utilities::Exceptions::ResourceException;
+using Varnholt::Utilities::Tools::lexical_cast;
+using Varnholt::Utilities::Tools::SmartPointer;
+using Bytes = std::vector<std::uint8_t>;
+
+namespace {
+
+constexpr const char* AccessDenied = "EEPROM access denied";
+constexpr const char* CalibrationName = "CalibrationData";
+constexpr std::uint32_t HalfSize = Protocol::EepromSize / 2;
+constexpr std::uint8_t UnreadByte = 0xAA;
+constexpr std::uint8_t UnusedByte = 0xFF;
+
+// What the two parts of the binary block must never reach.
+static_assert(EepromMap::BinaryFirst + EepromMap::BinaryFirstSize < EepromMap::EndOfLogArea);
+static_assert(EepromMap::BinarySecond + EepromMap::BinarySecondSize < EepromMap::EndOfLogArea);
+
+bool IsRawWord(std::uint16_t id) {
+    return id >= PropertyIds::FirstRawWord && id <= PropertyIds::LastRawWord;
+}
+
+std::uint32_t AddressOfRawWord(std::uint16_t id) {
+    return EepromMap::RawWords + (std::uint32_t{id} - PropertyIds::FirstRawWord) * EepromMap::RawWordSize;
+}
+
+Bytes Read(PellandoFunctionality& functionality, std::uint32_t address, std::uint32_t size) {
+    Bytes bytes(size, UnreadByte);
+    functionality.ReadEEPROM(address, bytes);
+    return bytes;
+}
+
+Bytes Joined(Bytes first, const Bytes& second) {
+    first.insert(first.end(), second.begin(), second.end());
+    return first;
+}
+
+bool IsRequested(const Properties& set, std::uint16_t request) {
+    return set.Contains(request) && set.GetProperty(request).AsLong() == 1;
+}
+
+}  // namespace
+
+PellandoEEPROM::PellandoEEPROM(const SmartPointer<PellandoFunctionality>& instrument) try
+    : functionality(instrument) {
+    Bytes first = Read(*functionality, 0, HalfSize);
+    const Bytes second = Read(*functionality, HalfSize, HalfSize);
+    const Bytes image = Joined(std::move(first), second);
+    eat = SmartPointer<PellandoEAT>(new PellandoEAT(image.begin() + EepromMap::Table));
+    log = SmartPointer<PellandoLog>(new PellandoLog(*eat, image.begin()));
+    SetupCalibrationData(image);
+}
+TRACED
+
+PellandoEEPROM::~PellandoEEPROM() {
+    std::string reason;
+    try {
+        DumpLog();
+        return;
+    } catch (const std::exception& exception) {
+        reason = exception.what();
+    } catch (...) {
+    }
+    try {
+        if (reportLostLog) {
+            reportLostLog(reason);
+        }
+    } catch (...) {
+        // Nobody is left to tell.
+    }
+}
+
+void PellandoEEPROM::SetupCalibrationData(const Bytes& image) try {
+    const SectionReader readSection(*eat, &ConfigurationDataConverter::IsCalibrationParameter);
+    calibration = readSection(image.data(), 0);
+    calibration.SetName(CalibrationName);
+}
+TRACED
+
+void PellandoEEPROM::ReportLostLog(LostLogHandler handler) {
+    reportLostLog = std::move(handler);
+}
+
+bool PellandoEEPROM::IsEEPROMProperty(std::uint16_t id) {
+    return ConfigurationDataConverter::IsLogParameter(id) ||
+           ConfigurationDataConverter::IsCalibrationParameter(id) || id == PropertyIds::WriteThroughRequest ||
+           id == PropertyIds::DumpLogRequest;
+}
+
+PellandoLog& PellandoEEPROM::GetLog() try { return *log; }
+TRACED
+
+PellandoLog& PellandoEEPROM::GetLog(bool dumpIfRecommended) try {
+    if (dumpIfRecommended && log->IsDumpRecommended()) {
+        DumpLog();
+    }
+    return *log;
+}
+TRACED
+
+const Property& PellandoEEPROM::Load(std::uint16_t id) try { return GetProperty(id); }
+TRACED
+
+Properties& PellandoEEPROM::Load(Properties& set) try {
+    if (set.GetItemCount() == 0) {
+        if (set.GetName() == CalibrationName) {
+            set = calibration;
+        } else if (set.GetName() == "LogData") {
+            set = GetLog().GetItems();
+        } else if (set.GetName() == "EATData") {
+            set = eat->GetDatastore();
+        }
+        return set;
+    }
+    for (auto& [id, value] : set.GetDatastore()) {
+        if (IsEEPROMProperty(id)) {
+            value = GetProperty(id);
+        }
+    }
+    return set;
+}
+TRACED
+
+void PellandoEEPROM::Store(Properties& set) try {
+    if (std::ranges::none_of(set.GetDatastore(),
+                             [](const auto& entry) { return IsEEPROMProperty(entry.first); })) {
+        return;
+    }
+    for (const auto& [id, value] : set.GetDatastore()) {
+        SetProperty(id, value);
+    }
+    if (IsRequested(set, PropertyIds::DumpLogRequest)) {
+        DumpLog();
+        return;
+    }
+    if (IsRequested(set, PropertyIds::WriteThroughRequest)) {
+        set.SetProperty(PropertyIds::WriteThroughRequest, Property(std::int32_t{0}));
+        Unlock();
+        try {
+            WriteThrough();
+        } catch (...) {
+            Lock();  // a failed transfer must not leave the EEPROM open
+            throw;
+        }
+        Lock();
+    }
+}
+TRACED
+
+const Property& PellandoEEPROM::GetProperty(std::uint16_t id) try {
+    if (ConfigurationDataConverter::IsLogParameter(id)) {
+        return GetLog().GetItem(id);
+    }
+    if (ConfigurationDataConverter::IsCalibrationParameter(id)) {
+        return calibration.GetProperty(id);
+    }
+    throw ResourceException("unknown property id = " + lexical_cast<std::string>(id), Here());
+}
+TRACED
+
+void PellandoEEPROM::SetProperty(std::uint16_t id, const Property& value) try {
+    if (ConfigurationDataConverter::IsLogParameter(id)) {
+        GetLog(true).SetItem(id, value);
+    } else if (ConfigurationDataConverter::IsCalibrationParameter(id)) {
+        calibration.SetProperty(id, value);
+    }
+}
+TRACED
+
+void PellandoEEPROM::StoreBinary(std::uint16_t id, const Bytes& data) try {
+    if (id == PropertyIds::BinaryBlock) {
+        if (data.size() != EepromMap::BinarySize) {
+            throw ResourceException("Wrong Tallimer size", Here());
+        }
+        const auto second = data.begin() + EepromMap::BinaryFirstSize;
+        functionality->WriteEEPROM(EepromMap::BinaryFirst, Bytes(data.begin(), second));
+        functionality->WriteEEPROM(EepromMap::BinarySecond, Bytes(second, data.end()));
+    } else if (IsRawWord(id)) {
+        const std::uint32_t address = AddressOfRawWord(id);
+        if (address >= EepromMap::EndOfLogArea || data.size() > EepromMap::EndOfLogArea - address) {
+            throw ResourceException(AccessDenied, Here());
+        }
+        functionality->WriteEEPROM(address, data);
+    }
+}
+TRACED
+
+Bytes PellandoEEPROM::LoadBinary(std::uint16_t id) try {
+    if (id == PropertyIds::BinaryBlock) {
+        Bytes first = Read(*functionality, EepromMap::BinaryFirst, EepromMap::BinaryFirstSize);
+        return Joined(std::move(first),
+                      Read(*functionality, EepromMap::BinarySecond, EepromMap::BinarySecondSize));
+    }
+    if (IsRawWord(id)) {
+        return Read(*functionality, AddressOfRawWord(id), EepromMap::RawWordSize);
+    }
+    return {};
+}
+TRACED
+
+Bytes PellandoEEPROM::Dump() try {
+    eat->EnsureConsistency(calibration);
+    PellandoLog& currentLog = GetLog(true);
+    currentLog.UpdateChecksum();  // which decides the checksum item's size
+    eat->EnsureConsistency(currentLog);
+    const Properties& items = currentLog.GetItems();
+    if (!eat->Locates(items, EepromMap::MainLog, 0) ||
+        !eat->Locates(calibration, EepromMap::Calibration, 0) ||
+        (eat->Holds(items, EepromMap::LogCopyIdOffset) &&
+         !eat->Locates(items, EepromMap::LogCopy, EepromMap::LogCopyIdOffset))) {
+        throw DataException(PellandoEAT::CorruptTable, Here());
+    }
+    Bytes image(Protocol::EepromSize, UnusedByte);
+    const auto at = [&image](std::ptrdiff_t address) { return image.begin() + address; };
+    GetLog(true).Dump(at(EepromMap::MainLog), at(EepromMap::LogCopy));
+    GetLog(true).Dump(at(EepromMap::LogCopy), at(EepromMap::EndOfLogArea));
+    eat->Dump(at(EepromMap::Table), at(EepromMap::Calibration));
+    calibration.Dump(at(EepromMap::Calibration), image.end(), true, true);
+    return image;
+}
+TRACED
+
+void PellandoEEPROM::Lock() try {
+    if (locked) {
+        throw ResourceException("EEPROM already locked", Here());
+    }
+    locked = true;
+}
+TRACED
+
+void PellandoEEPROM::Unlock() try {
+    if (!locked) {
+        throw ResourceException("EEPROM already unlocked", Here());
+    }
+    locked = false;
+}
+TRACED
+
+void PellandoEEPROM::ThrowIfLocked() const try {
+    if (locked) {
+        throw ResourceException(AccessDenied, Here());
+    }
+}
+TRACED
+
+void PellandoEEPROM::WriteThrough() try {
+    ThrowIfLocked();
+    DumpLog();
+}
+TRACED
+
+void PellandoEEPROM::DumpLog() try {
+    Bytes bytes(std::min<std::size_t>(log->SizeOf(), EepromMap::LogArea));
+    log->Dump(bytes.begin(), bytes.end());
+    functionality->WriteEEPROM(EepromMap::MainLog, bytes);
+    functionality->WriteEEPROM(EepromMap::LogCopy, bytes);
+}
+TRACED
+
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel
