@@ -1,0 +1,228 @@
+#include "UsbIo/CUsbIo.h"
+
+#include <cstdio>
+#include <cstring>
+#include <new>
+#include <string>
+
+#include "Platform/DeviceFiles.h"
+#include "UsbIo/StatusTexts.h"
+
+namespace Varnholt::UsbIo {
+
+using namespace Protocol::UsbIoDriver;
+using Platform::DeviceFiles;
+using Platform::DeviceInterfaces;
+using Platform::ErrorCode;
+
+namespace {
+
+constexpr std::uint16_t FirstInterfaceVersionBeyond = (InterfaceVersion & 0xFF00) + 0x0100;
+
+/// The code of the platform call that has just failed; never success, whatever the platform left behind.
+ErrorCode FailureCode() {
+    const ErrorCode code = Platform::LastError();
+    return code == Platform::Errors::Success ? Status::Failed : code;
+}
+
+}  // namespace
+
+CUsbIo::~CUsbIo() {
+    Close();
+}
+
+Platform::DeviceList CUsbIo::CreateDeviceList(const Protocol::Guid* interfaceGuid) {
+    if (!interfaceGuid || !DeviceInterfaces::Load()) {
+        return nullptr;
+    }
+    return DeviceInterfaces::MakeList(*interfaceGuid, false);
+}
+
+bool CUsbIo::DestroyDeviceList(Platform::DeviceList list) {
+    return DeviceInterfaces::Load() && (!list || DeviceInterfaces::DestroyList(list));
+}
+
+std::uint32_t CUsbIo::Open(int deviceNumber, Platform::DeviceList list,
+                           const Protocol::Guid* interfaceGuid) try {
+    if (IsOpen()) {
+        return Status::AlreadyOpen;
+    }
+    std::string path;
+    if (list) {
+        if (const std::uint32_t status = ReadDetail(deviceNumber, list, interfaceGuid)) {
+            DetailData.clear();
+            return status;
+        }
+        path = GetDevicePathName();
+    } else {
+        path = "\\\\.\\USBIO_Device" + std::to_string(deviceNumber);
+    }
+    std::uint32_t status = OpenPath(path);
+    if (status == Status::Success) {
+        DriverInfo info;
+        status = GetDriverInfo(info);
+        if (status == Status::Success && (info.interfaceVersion < InterfaceVersion ||
+                                          info.interfaceVersion >= FirstInterfaceVersionBeyond)) {
+            status = Status::VersionMismatch;
+        }
+    }
+    if (status != Status::Success) {
+        Close();
+    }
+    return status;
+} catch (const std::bad_alloc&) {
+    Close();
+    return Status::NoMemory;
+}
+
+std::uint32_t CUsbIo::OpenPath(const std::string& path) {
+    const Platform::Handle file = DeviceFiles().Open(path);
+    if (file == Platform::InvalidHandle()) {
+        const ErrorCode code = FailureCode();
+        return code == Platform::Errors::FileNotFound ? Status::DeviceNotFound : code;
+    }
+    FileHandle = file;
+    controlEvent = Platform::OwnedHandle(Platform::MakeAutoResetEvent());
+    if (!controlEvent) {
+        return Status::NoMemory;
+    }
+    controlRequest.emplace(controlEvent.Get());
+    return Status::Success;
+}
+
+std::uint32_t CUsbIo::ReadDetail(int deviceNumber, Platform::DeviceList list,
+                                 const Protocol::Guid* interfaceGuid) {
+    if (!list || !interfaceGuid) {
+        return Status::InvalidFunctionParameter;
+    }
+    if (!DeviceInterfaces::Load()) {
+        return Status::NoEnumeration;
+    }
+    DetailData.clear();
+    Platform::InterfaceRecord record;
+    if (!DeviceInterfaces::Find(list, *interfaceGuid, static_cast<std::uint32_t>(deviceNumber), record)) {
+        const ErrorCode code = FailureCode();
+        return code == Platform::Errors::NoMoreItems ? Status::NoSuchDeviceInstance : code;
+    }
+    const std::size_t size = DeviceInterfaces::DetailSize(list, record);
+    if (size <= Platform::InterfaceDetailPathOffset) {
+        return Status::Failed;
+    }
+    DetailData.assign(size, std::byte{0});
+    std::memcpy(DetailData.data(), &Platform::InterfaceDetailSizeField,
+                sizeof(Platform::InterfaceDetailSizeField));
+    if (!DeviceInterfaces::ReadDetail(list, record, DetailData)) {
+        return FailureCode();
+    }
+    DetailData.back() = std::byte{0};  // the path ends inside the record, whatever the platform filled in
+    return Status::Success;
+}
+
+void CUsbIo::Close() {
+    const Platform::Handle file = FileHandle.exchange(Platform::NoHandle);
+    if (file != Platform::NoHandle) {
+        DeviceFiles().CloseFile(file);
+    }
+    controlRequest.reset();
+    controlEvent.Reset();
+    DetailData.clear();
+}
+
+const char* CUsbIo::GetDevicePathName() const {
+    if (DetailData.empty()) {
+        return nullptr;
+    }
+    const void* const path = &DetailData[Platform::InterfaceDetailPathOffset];
+    return static_cast<const char*>(path);
+}
+
+std::uint32_t CUsbIo::IoctlSync(std::uint32_t code, const void* input, std::uint32_t inputSize, void* output,
+                                std::uint32_t outputSize, std::uint32_t* bytesReturned) {
+    if (!IsOpen()) {
+        return Status::DeviceNotOpen;
+    }
+    std::uint32_t transferred = 0;
+    std::uint32_t status = Status::Success;
+    {
+        Platform::CriticalSection::Holder hold(controlLock);
+        if (!controlRequest->StartControl(FileHandle, code, input, inputSize, output, outputSize)) {
+            status = FailureCode();
+        }
+        if (status == Platform::Errors::IoPending) {
+            Platform::Wait(controlEvent.Get(), Platform::Infinite);
+            status = Status::Success;
+        }
+        if (status == Status::Success && !controlRequest->GetResult(transferred)) {
+            status = FailureCode();
+        }
+        if (controlRequest->IsRunning()) {  // the wait was refused; the caller's buffers must be free again
+            transferred = controlRequest->CancelAndWait();
+        }
+    }
+    if (bytesReturned) {
+        *bytesReturned = transferred;
+    }
+    return status;
+}
+
+bool CUsbIo::CancelIo() {
+    return DeviceFiles().CancelTransfers(FileHandle);
+}
+
+std::uint32_t CUsbIo::GetDriverInfo(DriverInfo& info) {
+    DriverInfo::Bytes bytes{};
+    const std::uint32_t status =
+        IoctlSync(Control::GetDriverInfo, nullptr, 0, bytes.data(), bytes.size(), nullptr);
+    info = DriverInfo::Decode(bytes);
+    return status;
+}
+
+std::uint32_t CUsbIo::UnconfigureDevice() {
+    return IoctlSync(Control::UnconfigureDevice, nullptr, 0, nullptr, 0, nullptr);
+}
+
+std::uint32_t CUsbIo::SetConfiguration(const Configuration& configuration) {
+    if (configuration.interfaces.size() > ConfigurationBlock::MaximumEntries) {
+        return Status::InvalidFunctionParameter;
+    }
+    const Configuration::Bytes bytes = configuration.Encode();
+    return IoctlSync(Control::SetConfiguration, bytes.data(), bytes.size(), nullptr, 0, nullptr);
+}
+
+std::uint32_t CUsbIo::GetDeviceParameters(DeviceParameters& parameters) {
+    DeviceParameters::Bytes bytes{};
+    const std::uint32_t status =
+        IoctlSync(Control::GetDeviceParameters, nullptr, 0, bytes.data(), bytes.size(), nullptr);
+    parameters = DeviceParameters::Decode(bytes);
+    return status;
+}
+
+std::uint32_t CUsbIo::SetDeviceParameters(const DeviceParameters& parameters) {
+    const DeviceParameters::Bytes bytes = parameters.Encode();
+    return IoctlSync(Control::SetDeviceParameters, bytes.data(), bytes.size(), nullptr, 0, nullptr);
+}
+
+std::uint32_t CUsbIo::ClassOrVendorInRequest(void* buffer, std::uint32_t& length,
+                                             const ClassOrVendorRequest& request) {
+    const ClassOrVendorRequest::Bytes block = request.Encode();
+    return IoctlSync(Control::ClassOrVendorInRequest, block.data(), block.size(), buffer, length, &length);
+}
+
+std::uint32_t CUsbIo::ClassOrVendorOutRequest(const void* buffer, std::uint32_t& length,
+                                              const ClassOrVendorRequest& request) {
+    const ClassOrVendorRequest::Bytes block = request.Encode();
+    // The data to send stand in the control's output buffer, which the driver only reads here.
+    return IoctlSync(Control::ClassOrVendorOutRequest, block.data(), block.size(), const_cast<void*>(buffer),
+                     length, &length);
+}
+
+char* CUsbIo::ErrorText(char* buffer, std::size_t size, std::uint32_t status) {
+    if (buffer && size > 0) {
+        std::snprintf(buffer, size, "Error code 0x%08X: %s", static_cast<unsigned int>(status),
+                      StatusText(status));
+        buffer[size - 1] = '\0';
+    }
+    return buffer;
+}
+
+}  // namespace Varnholt::UsbIo

@@ -1,0 +1,58 @@
+#include "UsbIo/CUsbIoBuffer.h"
+
+#include <new>
+
+namespace Varnholt::UsbIo {
+
+using namespace Platform;
+
+CUsbIoBuffer::CUsbIoBuffer() : completionEvent(MakeAutoResetEvent()), request(completionEvent.Get()) {}
+
+CUsbIoBuffer::CUsbIoBuffer(void* data, std::uint32_t size) : CUsbIoBuffer() {
+    Buffer = data;
+    Size = size;
+}
+
+CUsbIoBuffer::CUsbIoBuffer(std::uint32_t size) : CUsbIoBuffer() {
+    allocatedMemory.reset(new (std::nothrow) std::uint8_t[size]);
+    Buffer = allocatedMemory.get();
+    Size = Buffer ? size : 0;
+}
+
+CUsbIoBuffer::~CUsbIoBuffer() {
+    CancelAndCollect();
+}
+
+bool CUsbIoBuffer::Start(Handle file, Direction direction) {
+    CancelAndCollect();
+    BytesTransferred = 0;
+    if (!completionEvent || NumberOfBytesToTransfer > Size) {
+        Status = completionEvent ? Errors::InvalidParameter : Errors::NoSystemResources;
+        return false;
+    }
+    const bool completedAtOnce = direction == Direction::Read
+                                     ? request.StartRead(file, Buffer, NumberOfBytesToTransfer)
+                                     : request.StartWrite(file, Buffer, NumberOfBytesToTransfer);
+    if (completedAtOnce) {
+        Collect();
+        return Status == Errors::Success || IsPending();
+    }
+    Status = LastError();
+    return IsPending();
+}
+
+void CUsbIoBuffer::Collect() {
+    Status = request.GetResult(BytesTransferred) ? Errors::Success : LastError();
+    if (Status == Errors::IoIncomplete) {
+        Status = Errors::IoPending;
+    }
+}
+
+void CUsbIoBuffer::CancelAndCollect() {
+    if (request.IsRunning()) {
+        BytesTransferred = request.CancelAndWait();
+        Status = Errors::OperationAborted;
+    }
+}
+
+}  // namespace Varnholt::UsbIo
