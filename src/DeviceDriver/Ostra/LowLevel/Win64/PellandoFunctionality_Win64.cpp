@@ -1,0 +1,424 @@
+#include "DeviceDriver/Ostra/LowLevel/Win64/PellandoFunctionality_Win64.h"
+
+#include <algorithm>
+#include <array>
+#include <iterator>
+#include <list>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Generic/Utilities/Timing.h"
+#include "DeviceDriver/Ostra/USB/USBBrowser.h"
+#include "Platform/ScopedThreadPriority.h"
+#include "Platform/Time.h"
+#include "UsbIo/ScopedDeviceList.h"
+#include "Utilities/Exceptions/Location.h"
+#include "Utilities/Exceptions/Trace.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+
+using namespace Protocol::UsbIoDriver;
+using Generic::Utilities::DataException;
+using Generic::Utilities::IOException;
+using Protocol::Request;
+using UsbIo::CUsbIo;
+using UsbIo::CUsbIoBuffer;
+using UsbIo::CUsbIoPipe;
+using Varnholt::Utilities::Exceptions::Here;
+using Varnholt::Utilities::Tools::SmartPointer;
+
+namespace {
+
+constexpr int MaximumDevices = 127;
+constexpr std::uint32_t CommandPause = 1;  // milliseconds before every vendor request
+constexpr std::uint64_t MillisecondsPerSecond = 1000;
+constexpr std::uint64_t ReadGrace = 5000;  // milliseconds on top of every time-out
+
+// Data stages, bytes.
+constexpr std::size_t MeasureParametersSize = 8;
+constexpr std::size_t MeasureModeSize = 6;
+constexpr std::size_t MemoryRequestSize = 8;
+constexpr std::size_t CpldWriteSize = 6;
+constexpr std::size_t CpldReadSize = 2;
+constexpr std::size_t MiscSize = 8;
+constexpr std::size_t ChipIdSize = 8;
+
+// Scans.
+constexpr std::uint32_t ScanTransferSize = MaximumTransferSize;
+constexpr std::uint32_t OpenEndedScanStartSize = 1280000;
+constexpr std::uint64_t MaximumScanSize = 0xFFFFFFFF;  // what the callers can count
+constexpr std::uint32_t ScanRecordSize = 256;
+constexpr std::uint32_t ScanRecordTime = 15;  // milliseconds that the instrument may take for one
+
+constexpr std::uint32_t BeepDelay = 370;
+constexpr std::uint32_t BeepHertz = 2140;
+constexpr std::uint32_t BeepLength = 75;
+
+void ThrowIfUsbIoError(std::uint32_t status, const char* operation) {
+    if (status == Status::Success) {
+        return;
+    }
+    std::array<char, 1024> text;
+    throw IOException(std::string("Error in UsbIo function: \"") + operation +
+                          "\" Error: " + CUsbIo::ErrorText(text.data(), text.size(), status),
+                      Here());
+}
+
+/// A huge time-out must not wrap into a short one, nor become the platform's mark for none.
+std::uint32_t TimeoutOf(std::uint64_t milliseconds) {
+    return static_cast<std::uint32_t>(std::min<std::uint64_t>(milliseconds, Platform::Infinite - 1));
+}
+
+template <std::size_t Size>
+void Put(std::vector<std::uint8_t>& data, std::size_t offset, const std::array<std::uint8_t, Size>& value) {
+    std::copy(value.begin(), value.end(), data.begin() + static_cast<std::ptrdiff_t>(offset));
+}
+
+template <std::size_t Size>
+void Take(const std::vector<std::uint8_t>& data, std::size_t offset, std::array<std::uint8_t, Size>& value) {
+    std::copy_n(data.begin() + static_cast<std::ptrdiff_t>(offset), Size, value.begin());
+}
+
+}  // namespace
+
+PellandoFunctionality_Win64::PellandoFunctionality_Win64(Generic::EventListener* listener,
+                                                         std::uint32_t deviceIndex) try
+    : device(new CUsbIo), writePipe(new CUsbIoPipe), readPipe(new CUsbIoPipe), interruptPipe(new CUsbIoPipe) {
+    InitUSBIO(deviceIndex);
+    interruptListener = SmartPointer<InterruptListener_Win64>(new InterruptListener_Win64(devicePath));
+    interruptListener->SetPipe(interruptPipe);
+    interruptListener->SetListener(listener);
+    interruptListener->Start();
+}
+TRACED
+
+PellandoFunctionality_Win64::~PellandoFunctionality_Win64() = default;
+
+void PellandoFunctionality_Win64::InitUSBIO(std::uint32_t deviceIndex) try {
+    const std::list<std::string> names = USB::USBBrowser::Instance()->GetDevices(0);
+    if (deviceIndex >= names.size()) {
+        throw IOException("No such device connected", Here());
+    }
+    const std::string& wanted = *std::next(names.begin(), static_cast<std::ptrdiff_t>(deviceIndex));
+    const UsbIo::ScopedDeviceList list(InterfaceClass);
+    if (!list.Get()) {
+        throw IOException("Unable to create device list.", Here());
+    }
+    for (int number = 0; number < MaximumDevices; ++number) {
+        if (device->Open(number, list.Get(), &InterfaceClass) != Status::Success) {
+            break;
+        }
+        if (device->GetDevicePathName() == wanted) {
+            devicePath = wanted;
+            Configure(number, list.Get());
+            return;
+        }
+        device->Close();
+    }
+    throw IOException("requested device not found", Here());
+}
+TRACED
+
+void PellandoFunctionality_Win64::Configure(int deviceNumber, Platform::DeviceList list) {
+    ThrowIfUsbIoError(device->UnconfigureDevice(), "UnconfigureDevice");
+    const std::array<UsbIo::InterfaceSetting, 1> interfaces{{{0, 0, MaximumTransferSize}}};
+    ThrowIfUsbIoError(device->SetConfiguration({0, interfaces}), "SetConfiguration");
+    UsbIo::DeviceParameters parameters;
+    ThrowIfUsbIoError(device->GetDeviceParameters(parameters), "GetDeviceParameters");
+    parameters.words[1] = 0;
+    ThrowIfUsbIoError(device->SetDeviceParameters(parameters), "SetDeviceParameters");
+    const auto bind = [&](CUsbIoPipe& pipe, std::uint8_t endpoint, const char* operation) {
+        ThrowIfUsbIoError(pipe.Bind(deviceNumber, endpoint, list, &InterfaceClass), operation);
+    };
+    bind(*writePipe, Protocol::BulkOutEndpoint, "BindTX");
+    bind(*readPipe, Protocol::BulkInEndpoint, "BindRX");
+    bind(*interruptPipe, Protocol::InterruptInEndpoint, "BindIR");
+}
+
+void PellandoFunctionality_Win64::VendorOutRequest(Request request, const Bytes& data,
+                                                   std::uint16_t value) try {
+    Platform::SleepMilliseconds(CommandPause);
+    UsbIo::ClassOrVendorRequest block;
+    block.request = static_cast<std::uint8_t>(request);
+    block.value = value;
+    auto length = static_cast<std::uint32_t>(data.size());
+    ThrowIfUsbIoError(device->ClassOrVendorOutRequest(data.empty() ? nullptr : data.data(), length, block),
+                      "ClassOrVendorOutRequest");
+}
+TRACED
+
+void PellandoFunctionality_Win64::VendorInRequest(Request request, Bytes& data) try {
+    Platform::SleepMilliseconds(CommandPause);
+    UsbIo::ClassOrVendorRequest block;
+    block.request = static_cast<std::uint8_t>(request);
+    auto length = static_cast<std::uint32_t>(data.size());
+    ThrowIfUsbIoError(device->ClassOrVendorInRequest(data.empty() ? nullptr : data.data(), length, block),
+                      "ClassOrVendorInRequest");
+}
+TRACED
+
+void PellandoFunctionality_Win64::ReadData(std::uint8_t* buffer, std::uint32_t length,
+                                           std::uint64_t timeout) try {
+    ThrowIfUsbIoError(readPipe->ReadSync(buffer, length, TimeoutOf(timeout + ReadGrace)), "ReadSync");
+}
+TRACED
+
+void PellandoFunctionality_Win64::WriteData(const std::uint8_t* buffer, std::uint32_t length) try {
+    ThrowIfUsbIoError(writePipe->WriteSync(buffer, length, Platform::Infinite), "WriteSync");
+}
+TRACED
+
+void PellandoFunctionality_Win64::RemoveListener(Generic::EventListener*) try {
+    if (!interruptListener.IsEmpty()) {
+        interruptListener->ClearListener();
+    }
+}
+TRACED
+
+void PellandoFunctionality_Win64::MeasureRequest(std::uint8_t* buffer, std::uint32_t length,
+                                                 std::uint32_t timeoutSeconds) try {
+    VendorOutRequest(Request::Measure, {});
+    ReadData(buffer, length, timeoutSeconds * MillisecondsPerSecond);
+}
+TRACED
+
+void PellandoFunctionality_Win64::SetMeasureParameters(const Bytes2& p1, const Bytes2& p2, const Bytes2& p3,
+                                                       std::uint8_t p4) try {
+    Bytes data(MeasureParametersSize);
+    Put(data, 0, p1);
+    Put(data, 2, p2);
+    Put(data, 4, p3);
+    data[6] = p4;
+    VendorOutRequest(Request::SetMeasureParameters, data);
+}
+TRACED
+
+void PellandoFunctionality_Win64::GetMeasureParameters(Bytes2& p1, Bytes2& p2, Bytes2& p3, std::uint8_t& p4,
+                                                       std::uint8_t& p5) try {
+    Bytes data(MeasureParametersSize);
+    VendorInRequest(Request::GetMeasureParameters, data);
+    Take(data, 0, p1);
+    Take(data, 2, p2);
+    Take(data, 4, p3);
+    p4 = data[6];
+    p5 = data[7];
+}
+TRACED
+
+void PellandoFunctionality_Win64::SetMeasureMode(std::uint8_t mode) try {
+    VendorOutRequest(Request::SetMeasureMode, {mode});
+}
+TRACED
+
+void PellandoFunctionality_Win64::GetMeasureMode(std::uint8_t& m1, std::uint8_t& m2, std::uint8_t& m3,
+                                                 std::uint8_t& m4, std::uint8_t& m5, std::uint8_t& m6) try {
+    Bytes data(MeasureModeSize);
+    VendorInRequest(Request::GetMeasureMode, data);
+    m1 = data[0];
+    m2 = data[1];
+    m3 = data[2];
+    m4 = data[3];
+    m5 = data[4];
+    m6 = data[5];
+}
+TRACED
+
+void PellandoFunctionality_Win64::WriteEEPROM(const Bytes4& address, const Bytes2& length,
+                                              const std::uint8_t* data, std::uint32_t count) try {
+    WriteMemory(Request::WriteEeprom, address, length, data, count);
+}
+TRACED
+
+void PellandoFunctionality_Win64::DownloadEEPROMFirmware(const Bytes4& address, const Bytes2& length,
+                                                         const std::uint8_t* image, std::uint32_t count) try {
+    WriteMemory(Request::DownloadEepromFirmware, address, length, image, count);
+}
+TRACED
+
+void PellandoFunctionality_Win64::WriteMemory(Request request, const Bytes4& address, const Bytes2& length,
+                                              const std::uint8_t* data, std::uint32_t count) {
+    Bytes block(MemoryRequestSize);
+    Put(block, 0, address);
+    Put(block, 4, length);
+    VendorOutRequest(request, block);
+    WriteData(data, count);
+    const std::uint8_t end = 0;
+    WriteData(&end, sizeof(end));
+    WriteData(&end, sizeof(end));
+}
+
+void PellandoFunctionality_Win64::ReadEEPROM(const Bytes4& address, const Bytes2& length, std::uint8_t* data,
+                                             std::uint32_t count) try {
+    Bytes block(MemoryRequestSize);
+    Put(block, 0, address);
+    Put(block, 4, length);
+    VendorOutRequest(Request::ReadEeprom, block);
+    ReadData(data, count, count);
+}
+TRACED
+
+void PellandoFunctionality_Win64::WriteCPLD(const Bytes2& c1, const Bytes2& c2, const Bytes2& c3) try {
+    Bytes data(CpldWriteSize);
+    Put(data, 0, c1);
+    Put(data, 2, c2);
+    Put(data, 4, c3);
+    VendorOutRequest(Request::WriteCpld, data);
+}
+TRACED
+
+void PellandoFunctionality_Win64::ReadCPLD(Bytes2& value) try {
+    Bytes data(CpldReadSize);
+    VendorInRequest(Request::ReadCpld, data);
+    Take(data, 0, value);
+}
+TRACED
+
+void PellandoFunctionality_Win64::DownloadRAMFirmware(std::uint16_t address, const std::uint8_t* image,
+                                                      std::uint32_t count) try {
+    VendorOutRequest(Request::DownloadRamFirmware, Bytes(image, image + count), address);
+}
+TRACED
+
+void PellandoFunctionality_Win64::GetMISC(std::uint8_t& m1, Bytes2& m2, std::uint8_t& m3, Bytes2& m4,
+                                          Bytes2& m5) try {
+    Bytes data(MiscSize);
+    VendorInRequest(Request::GetMisc, data);
+    Take(data, 0, m2);
+    Take(data, 2, m4);
+    Take(data, 4, m5);
+    m1 = data[6];
+    m3 = data[7];
+}
+TRACED
+
+void PellandoFunctionality_Win64::GetChipID(std::uint8_t* id) try {
+    Bytes data(ChipIdSize);
+    VendorInRequest(Request::GetChipId, data);
+    std::copy(data.begin(), data.end(), id);
+}
+TRACED
+
+void PellandoFunctionality_Win64::Reset(const Bytes2& code) try {
+    VendorOutRequest(Request::Reset, {code[1]});
+}
+TRACED
+
+void PellandoFunctionality_Win64::GetDeviceIdentifier(std::string& identifier) try {
+    identifier = device->GetDevicePathName();
+}
+TRACED
+
+void PellandoFunctionality_Win64::StartScan(std::uint32_t, std::uint32_t, std::uint32_t total) try {
+    PrepareScan(total);
+    if (!fixedSize) {
+        StartBeep();
+    }
+    const Platform::ScopedThreadPriority priority(Platform::HighestThreadPriority);
+    VendorOutRequest(Request::Measure, {});
+    ReadMeasureData();
+    scanEnd = static_cast<std::uint32_t>(scanData.size());
+}
+TRACED
+
+void PellandoFunctionality_Win64::GetScanData(std::uint8_t* buffer, std::uint32_t* size) try {
+    *size = std::min(*size, scanEnd - readPosition);
+    std::copy_n(scanData.begin() + static_cast<std::ptrdiff_t>(readPosition), *size, buffer);
+    readPosition += *size;
+}
+TRACED
+
+void PellandoFunctionality_Win64::PrepareScan(std::uint32_t total) {
+    fixedSize = total != 0;
+    received = 0;
+    readPosition = 0;
+    scanEnd = 0;
+    const std::size_t size = fixedSize ? total : OpenEndedScanStartSize;
+    if (scanData.capacity() < size) {
+        Bytes().swap(scanData);  // before, not after the new memory is taken
+    }
+    scanData.assign(size, 0);
+}
+
+void PellandoFunctionality_Win64::ReadMeasureData() try {
+    // Whichever way this block is left: a buffer is gone only when its transfer has ended.
+    CUsbIoBuffer a(ScanTransferSize);
+    CUsbIoBuffer b(ScanTransferSize);
+    if (!a.Buffer || !b.Buffer) {
+        throw std::bad_alloc();
+    }
+    CUsbIoBuffer* current = &a;
+    CUsbIoBuffer* next = &b;
+    current->NumberOfBytesToTransfer =
+        fixedSize ? static_cast<std::uint32_t>(std::min<std::size_t>(scanData.size(), ScanTransferSize))
+                  : ScanTransferSize;
+    readPipe->Read(*current);
+    while (ReadMeasureDataInternal(*current, *next)) {
+        std::swap(current, next);
+    }
+    scanData.resize(received);
+}
+TRACED
+
+bool PellandoFunctionality_Win64::ReadMeasureDataInternal(CUsbIoBuffer& current, CUsbIoBuffer& next) try {
+    next.NumberOfBytesToTransfer = ScanTransferSize;
+    const std::uint64_t asked = std::uint64_t{received} + current.NumberOfBytesToTransfer;
+    if (fixedSize && asked <= scanData.size()) {
+        next.NumberOfBytesToTransfer =
+            static_cast<std::uint32_t>(std::min<std::uint64_t>(scanData.size() - asked, ScanTransferSize));
+    }
+    // Where it cannot be started, the wait for it will tell.
+    readPipe->Read(next);
+
+    const std::uint32_t timeout = current.NumberOfBytesToTransfer / ScanRecordSize * ScanRecordTime +
+                                  static_cast<std::uint32_t>(ReadGrace);
+    ThrowIfUsbIoError(readPipe->WaitForCompletion(current, timeout), "WaitForCompletion1");
+    CopyDataToBufferInternal(current);
+    if (current.BytesTransferred > 0 && current.BytesTransferred >= current.NumberOfBytesToTransfer) {
+        return true;
+    }
+    readPipe->WaitForCompletion(next, 0);
+    readPipe->CancelIo();
+    return false;
+}
+TRACED
+
+void PellandoFunctionality_Win64::CopyDataToBufferInternal(const CUsbIoBuffer& buffer) try {
+    const std::uint32_t count = buffer.BytesTransferred;
+    if (count == 0) {
+        return;
+    }
+    const std::uint64_t end = std::uint64_t{received} + count;
+    if (scanData.capacity() < end) {
+        if (fixedSize) {
+            throw DataException("buffer size is fix", Here());
+        }
+        scanData.reserve(scanData.size() * 2);
+    }
+    if (fixedSize ? scanData.size() < end : end > MaximumScanSize) {
+        throw DataException("more bytes read than expected", Here());
+    }
+    const auto* const source = static_cast<const std::uint8_t*>(buffer.Buffer);
+    const std::size_t inPlace = std::min<std::size_t>(count, scanData.size() - received);
+    std::copy_n(source, inPlace, scanData.begin() + static_cast<std::ptrdiff_t>(received));
+    scanData.insert(scanData.end(), source + inPlace, source + count);
+    received = static_cast<std::uint32_t>(end);
+}
+TRACED
+
+void PellandoFunctionality_Win64::StartBeep() {
+    const auto entry = [](void*) -> std::uint32_t {
+        try {
+            BeepTask();
+        } catch (...) {  // a scan does without its beep
+        }
+        return 0;
+    };
+    const Platform::OwnedHandle thread(Platform::StartThread(entry, nullptr));
+}
+
+void PellandoFunctionality_Win64::BeepTask() try {
+    Generic::Utilities::Timing::Instance()->DeviceDriverSleep(BeepDelay);
+    Platform::Beep(BeepHertz, BeepLength);
+}
+TRACED
+
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

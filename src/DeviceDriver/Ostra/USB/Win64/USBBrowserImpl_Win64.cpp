@@ -1,0 +1,34 @@
+#include "DeviceDriver/Ostra/USB/Win64/USBBrowserImpl_Win64.h"
+
+#include "UsbIo/ScopedDeviceList.h"
+#include "Utilities/Exceptions/Trace.h"
+
+namespace Varnholt::DeviceDriver::Ostra::USB {
+
+namespace {
+constexpr int MaximumDevices = 127;
+}
+
+std::list<std::string> USBBrowserImpl_Win64::GetDevices(const std::int32_t&) try {
+    const Protocol::Guid& interfaceClass = Protocol::UsbIoDriver::InterfaceClass;
+    std::list<std::string> paths;
+    UsbIo::CUsbIo device;
+    const UsbIo::ScopedDeviceList list(interfaceClass);
+    if (!list.Get()) {
+        return paths;
+    }
+    for (int number = 0; number < MaximumDevices; ++number) {
+        if (device.Open(number, list.Get(), &interfaceClass) != Protocol::UsbIoDriver::Status::Success) {
+            break;
+        }
+        paths.emplace_back(device.GetDevicePathName());
+        device.Close();
+    }
+    return paths;
+}
+TRACED
+
+bool USBBrowserImpl_Win64::IsAnyOstraConnected() try { return !GetDevices(0).empty(); }
+TRACED
+
+}  // namespace Varnholt::DeviceDriver::Ostra::USB

@@ -1,0 +1,21 @@
+#pragma once
+
+#include "Platform/Threads.h"
+
+namespace Varnholt::Platform {
+
+/// Gives the calling thread a priority for the life of a block, however the block is left.
+class ScopedThreadPriority final {
+  public:
+    explicit ScopedThreadPriority(int level) : previous(CurrentThreadPriority()) {
+        SetCurrentThreadPriority(level);
+    }
+    ~ScopedThreadPriority() { SetCurrentThreadPriority(previous); }
+    ScopedThreadPriority(const ScopedThreadPriority&) = delete;
+    ScopedThreadPriority& operator=(const ScopedThreadPriority&) = delete;
+
+  private:
+    const int previous;
+};
+
+}  // namespace Varnholt::Platform
