@@ -13,6 +13,7 @@ using ErrorCode = std::uint32_t;
 
 namespace Errors {
 inline constexpr ErrorCode Success = 0;
+inline constexpr ErrorCode InvalidFunction = 1;
 inline constexpr ErrorCode FileNotFound = 2;
 inline constexpr ErrorCode PathNotFound = 3;
 inline constexpr ErrorCode AccessDenied = 5;

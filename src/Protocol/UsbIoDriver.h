@@ -29,6 +29,7 @@ namespace Status {
 inline constexpr std::uint32_t Success = 0;
 inline constexpr std::uint32_t DeviceNotResponding = 0xE0000005;
 inline constexpr std::uint32_t DataOverrun = 0xE0000008;
+inline constexpr std::uint32_t TransactionError = 0xE0000011;
 inline constexpr std::uint32_t BabbleDetected = 0xE0000012;
 inline constexpr std::uint32_t EndpointHalted = 0xE0000030;
 inline constexpr std::uint32_t NoMemory = 0xE0000100;

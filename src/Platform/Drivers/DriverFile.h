@@ -1,0 +1,65 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <span>
+
+#include "Platform/Drivers/SharedDevice.h"
+#include "Platform/ErrorCodes.h"
+#include "Platform/Usb/UsbDevice.h"
+
+namespace Varnholt::Platform::Drivers {
+
+/// What a driver makes of a request on one of its files.
+struct Decision {
+    enum class Kind {
+        Refused,  ///< the request ends before it began, with `code`
+        Done,     ///< finished without a transfer; `bytes` were moved
+        Send,     ///< the transfer is filled in and goes to the device
+    };
+    Kind kind;
+    ErrorCode code = Errors::Success;
+    std::uint32_t bytes = 0;
+
+    static Decision Refuse(ErrorCode code) { return {Kind::Refused, code, 0}; }
+    static Decision Done(std::uint32_t bytes) { return {Kind::Done, Errors::Success, bytes}; }
+    static Decision Send() { return {Kind::Send, Errors::Success, 0}; }
+};
+
+/// A driver's side of one open file: which requests it takes, what they become on the bus, and its codes. One
+/// per handle; destroyed when the handle is closed and all its requests have completed. All operations may be
+/// called from any thread.
+class DriverFile {
+  public:
+    explicit DriverFile(std::shared_ptr<SharedDevice> shared) : device(std::move(shared)) {}
+    virtual ~DriverFile() = default;
+    DriverFile(const DriverFile&) = delete;
+    DriverFile& operator=(const DriverFile&) = delete;
+
+    /// Decide on a read or write; buffer and length stand in `transfer`, which gets its endpoint. On the path
+    /// of every transfer: must not block.
+    virtual Decision Read(Usb::Transfer& transfer) = 0;
+    virtual Decision Write(Usb::Transfer& transfer) = 0;
+    /// Decides on a device control, or carries it out. `output` is the data stage of a vendor request in
+    /// either direction. May block where the device is set up.
+    virtual Decision Control(std::uint32_t code, std::span<const std::uint8_t> input,
+                             std::span<std::uint8_t> output, Usb::Transfer& transfer) = 0;
+
+    /// The driver's code for how a transfer ended, and for a request that the USB device refused.
+    virtual ErrorCode OutcomeOf(Usb::TransferStatus status) const = 0;
+    virtual ErrorCode RefusalOf(ErrorCode usbCode) const = 0;
+
+    SharedDevice& Device() const { return *device; }
+
+  private:
+    const std::shared_ptr<SharedDevice> device;
+};
+
+/// Ends what runs on an endpoint of a device, whichever file and thread started it.
+class EndpointCanceller {
+  public:
+    virtual ~EndpointCanceller() = default;
+    virtual void CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) = 0;
+};
+
+}  // namespace Varnholt::Platform::Drivers

@@ -1,0 +1,46 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <span>
+
+#include "Platform/Drivers/DriverFile.h"
+
+namespace Varnholt::Platform::Drivers {
+
+/// A file of the instrument's own driver: the device itself (pipe 0), which takes device controls, or one of
+/// the pipes below it. Every file has a share in the claim to the device.
+///
+/// Requests of a kind that the file does not take end with `Errors::InvalidFunction`. The driver clears the
+/// halt of an endpoint before the next transfer on it. A read of no bytes completes at once and reaches no
+/// endpoint; a write of no bytes is sent as an empty packet.
+class NativeDriverFile final : public DriverFile {
+  public:
+    /// Claims the device. Null on failure with the code in `error`; `Errors::FileNotFound` where the device
+    /// has no such endpoint.
+    static std::unique_ptr<NativeDriverFile> Open(std::shared_ptr<SharedDevice> shared,
+                                                  std::uint32_t pipeNumber,
+                                                  EndpointCanceller& endpointCanceller, ErrorCode& error);
+    ~NativeDriverFile() override;
+
+    Decision Read(Usb::Transfer& transfer) override;
+    Decision Write(Usb::Transfer& transfer) override;
+    /// - `ControlVendorRequest`: the control block's request with `output` as its data stage.
+    /// - `ControlAbortPipe`: ends the transfers of the endpoint that the block's value names.
+    /// - `ControlButtonReport`: the block's request without a data stage, because what callers hand over as
+    ///   data has no defined content.
+    Decision Control(std::uint32_t code, std::span<const std::uint8_t> input, std::span<std::uint8_t> output,
+                     Usb::Transfer& transfer) override;
+
+    ErrorCode OutcomeOf(Usb::TransferStatus status) const override;
+    ErrorCode RefusalOf(ErrorCode usbCode) const override;
+
+  private:
+    NativeDriverFile(std::shared_ptr<SharedDevice> shared, std::uint8_t pipeEndpoint,
+                     EndpointCanceller& endpointCanceller);
+
+    const std::uint8_t endpoint;  ///< 0: the device itself
+    EndpointCanceller& canceller;
+};
+
+}  // namespace Varnholt::Platform::Drivers

@@ -1,0 +1,423 @@
+#include "Platform/Drivers/OpenFile.h"
+
+#include <array>
+#include <new>
+#include <utility>
+
+#include "Platform/Drivers/RecordState.h"
+#include "Platform/Threads.h"
+#include "Platform/WaitableObjects.h"
+
+namespace Varnholt::Platform::Drivers {
+namespace {
+
+Decision Decide(DriverFile& driver, const Operation& operation, Usb::Transfer& transfer) {
+    transfer.data = operation.data;
+    transfer.length = operation.length;
+    switch (operation.kind) {
+        case Operation::Kind::Read:
+            return driver.Read(transfer);
+        case Operation::Kind::Write:
+            return driver.Write(transfer);
+        case Operation::Kind::Control:
+            break;
+    }
+    try {
+        return driver.Control(operation.code, operation.input, {operation.data, operation.length}, transfer);
+    } catch (const std::bad_alloc&) {
+        return Decision::Refuse(driver.RefusalOf(Errors::NotEnoughMemory));
+    } catch (...) {
+        return Decision::Refuse(driver.RefusalOf(Errors::GeneralFailure));
+    }
+}
+
+bool NotStarted(Overlapped& record, ErrorCode code) {
+    MarkNotStarted(record, code);
+    SetLastError(code);
+    return false;
+}
+
+}  // namespace
+
+/// A thread that waits for the end of one request, or of all. Lives on that thread's stack; whoever takes it
+/// off the list releases it and does not touch it afterwards.
+struct OpenFile::Waiter {
+    const RunningRequest* request = nullptr;  ///< null: until the file is idle
+    OwnedHandle event;                        ///< none if it cannot be made: then `released` is polled
+    std::atomic<bool> released{false};
+    Waiter* next = nullptr;
+};
+
+void RunningRequest::TransferCompleted(Usb::Transfer&) noexcept {
+    if ((state.fetch_or(Completed, std::memory_order_acq_rel) & Submitted) != 0) {
+        file.Ended(*this);
+    }
+}
+
+OpenFile::~OpenFile() {
+    while (spare != nullptr) {
+        delete std::exchange(spare, spare->next);
+    }
+}
+
+std::uint32_t OpenFile::Open(std::unique_ptr<DriverFile> opened) {
+    const std::lock_guard guard(lock);
+    driver = std::move(opened);
+    use = Use::Open;
+    generation = (generation + 1) & ((1U << GenerationBits) - 1);
+    return generation;
+}
+
+std::uint32_t OpenFile::Generation() const {
+    const std::lock_guard guard(lock);
+    return generation;
+}
+
+bool OpenFile::IsFree() const {
+    const std::lock_guard guard(lock);
+    return use == Use::Free;
+}
+
+void OpenFile::Free() {
+    const std::lock_guard guard(lock);
+    use = Use::Free;
+}
+
+std::unique_ptr<DriverFile> OpenFile::Close(std::uint32_t openedAs) {
+    {
+        const std::lock_guard guard(lock);
+        if (use != Use::Open || generation != openedAs) {
+            return nullptr;
+        }
+        use = Use::Closing;  // nothing starts from here on
+    }
+    Cancel([](const RunningRequest&) { return true; });
+    AwaitIdle();
+
+    RunningRequest* unused = nullptr;
+    OwnedHandle event;
+    std::unique_ptr<DriverFile> closed;
+    {
+        const std::lock_guard guard(lock);
+        use = Use::Closed;
+        closed = std::move(driver);
+        std::swap(unused, spare);
+        event = std::move(spareEvent);
+    }
+    while (unused != nullptr) {
+        delete std::exchange(unused, unused->next);
+    }
+    return closed;
+}
+
+bool OpenFile::Start(std::uint32_t openedAs, const Operation& operation, Overlapped& record) {
+    if (IsRunning(record)) {
+        SetLastError(Errors::InvalidParameter);
+        return false;
+    }
+    ErrorCode error = Errors::InvalidHandle;
+    RunningRequest* const request = Begin(openedAs, record, error);
+    if (request == nullptr) {
+        return NotStarted(record, error);
+    }
+    const Decision decision = Decide(*driver, operation, request->transfer);
+    if (decision.kind == Decision::Kind::Refused) {
+        Retire(*request);
+        return NotStarted(record, decision.code);
+    }
+    request->endpoint.store(request->transfer.endpoint, std::memory_order_relaxed);
+    MarkRunning(record);
+    if (decision.kind == Decision::Kind::Done) {
+        MarkEnded(record, Errors::Success, decision.bytes);
+        Retire(*request);
+        return true;
+    }
+    const ErrorCode refused = driver->Device().Submit(request->transfer);
+    if (refused != Errors::Success) {
+        const ErrorCode code = driver->RefusalOf(refused);
+        Retire(*request);
+        return NotStarted(record, code);
+    }
+    // Once `Submitted` is set, the request can end at any moment and is not touched any more.
+    std::uint32_t before = 0;
+    if (request->state.compare_exchange_strong(before, RunningRequest::Submitted,
+                                               std::memory_order_acq_rel)) {
+        SetLastError(Errors::IoPending);
+        return false;
+    }
+    if ((before & RunningRequest::Completed) == 0) {
+        CancelAfterSubmit(*request);
+        SetLastError(Errors::IoPending);
+        return false;
+    }
+    if (Finish(*request) == Errors::Success) {
+        return true;
+    }
+    // A transfer that fails at once was started all the same: its failure is the request's result.
+    SetLastError(Errors::IoPending);
+    return false;
+}
+
+RunningRequest* OpenFile::Begin(std::uint32_t openedAs, Overlapped& record, ErrorCode& error) {
+    const std::lock_guard guard(lock);
+    if (use != Use::Open || generation != openedAs) {
+        error = Errors::InvalidHandle;
+        return nullptr;
+    }
+    RunningRequest* request = spare;
+    if (request != nullptr) {
+        spare = request->next;
+    } else {
+        request = new (std::nothrow) RunningRequest(*this);
+        if (request == nullptr) {
+            error = Errors::NotEnoughMemory;
+            return nullptr;
+        }
+    }
+    request->record = &record;
+    request->starter = std::this_thread::get_id();
+    request->state.store(0, std::memory_order_relaxed);
+    request->endpoint.store(RunningRequest::Undecided, std::memory_order_relaxed);
+    request->number = ++lastNumber;
+    request->ended = false;
+    request->previous = nullptr;
+    request->next = running;
+    if (running != nullptr) {
+        running->previous = request;
+    }
+    running = request;
+    return request;
+}
+
+/// The starter's part of a cancellation that came before the device had the transfer.
+void OpenFile::CancelAfterSubmit(RunningRequest& request) {
+    {
+        const std::lock_guard guard(lock);
+        Pin(request);
+    }
+    const std::uint32_t before = request.state.fetch_or(RunningRequest::Submitted, std::memory_order_acq_rel);
+    if ((before & RunningRequest::Completed) != 0) {
+        Finish(request);
+    } else {
+        driver->Device().Cancel(request.transfer);
+    }
+    Unpin(request);
+}
+
+void OpenFile::Ended(RunningRequest& request) {
+    Finish(request);
+}
+
+ErrorCode OpenFile::Finish(RunningRequest& request) {
+    const Usb::Transfer& transfer = request.transfer;
+    driver->Device().Learn(transfer);
+    const ErrorCode code = driver->OutcomeOf(transfer.status);
+    const std::uint32_t moved =
+        transfer.actualLength < transfer.length ? transfer.actualLength : transfer.length;
+    // The record first: `Close` lets go of the caller's memory as soon as the request is off the list.
+    MarkEnded(*request.record, code, moved);
+    Retire(request);
+    return code;
+}
+
+void OpenFile::Retire(RunningRequest& request) {
+    Waiter* released = nullptr;
+    {
+        const std::lock_guard guard(lock);
+        (request.previous != nullptr ? request.previous->next : running) = request.next;
+        if (request.next != nullptr) {
+            request.next->previous = request.previous;
+        }
+        request.ended = true;
+        if (request.pins == 0) {
+            Recycle(request);
+        }
+        released = waiters != nullptr ? TakeReleased() : nullptr;
+    }
+    Release(released);
+}
+
+void OpenFile::Recycle(RunningRequest& request) {
+    request.record = nullptr;
+    request.next = spare;
+    spare = &request;
+}
+
+void OpenFile::Pin(RunningRequest& request) {
+    if (request.pins++ == 0) {
+        ++pinned;
+    }
+}
+
+void OpenFile::Unpin(RunningRequest& request) {
+    Waiter* released = nullptr;
+    {
+        const std::lock_guard guard(lock);
+        if (--request.pins == 0) {
+            --pinned;
+            if (request.ended) {
+                Recycle(request);
+            }
+        }
+        released = waiters != nullptr ? TakeReleased() : nullptr;
+    }
+    Release(released);
+}
+
+template <class Matches>
+void OpenFile::Cancel(Matches matches) {
+    struct Chosen {
+        RunningRequest* request;
+        bool submitted;
+    };
+    std::array<Chosen, 8> chosen{};
+    std::uint64_t newest = 0;  // what starts meanwhile is not meant
+    for (bool isFirst = true;; isFirst = false) {
+        std::size_t count = 0;
+        {
+            const std::lock_guard guard(lock);
+            newest = isFirst ? lastNumber : newest;
+            for (auto* request = running; request != nullptr && count < chosen.size();
+                 request = request->next) {
+                if (request->number > newest || !matches(*request)) {
+                    continue;
+                }
+                const std::uint32_t before =
+                    request->state.fetch_or(RunningRequest::CancelWanted, std::memory_order_acq_rel);
+                if ((before & RunningRequest::CancelWanted) == 0) {
+                    Pin(*request);
+                    chosen[count++] = {request, (before & RunningRequest::Submitted) != 0};
+                }
+            }
+        }
+        if (count == 0) {
+            return;
+        }
+        for (std::size_t i = 0; i < count; ++i) {
+            if (chosen[i].submitted) {
+                driver->Device().Cancel(chosen[i].request->transfer);
+            }
+            Unpin(*chosen[i].request);
+        }
+    }
+}
+
+bool OpenFile::CancelOwn(std::uint32_t openedAs) {
+    {
+        const std::lock_guard guard(lock);
+        if (use != Use::Open || generation != openedAs) {
+            return false;
+        }
+    }
+    const auto self = std::this_thread::get_id();
+    Cancel([self](const RunningRequest& request) { return request.starter == self; });
+    return true;
+}
+
+void OpenFile::CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) {
+    // The file may be another's by now, hence the question at each request; where one runs there is a driver.
+    Cancel([&device, endpoint, this](const RunningRequest& request) {
+        return request.endpoint.load(std::memory_order_relaxed) == endpoint && &driver->Device() == &device;
+    });
+}
+
+bool OpenFile::WaitFor(std::uint32_t openedAs, const Overlapped& record) {
+    while (IsRunning(record)) {
+        Waiter waiter;
+        GiveEvent(waiter);
+        bool enlisted = false;
+        {
+            const std::lock_guard guard(lock);
+            const RunningRequest* request = generation == openedAs ? running : nullptr;
+            while (request != nullptr && request->record != &record) {
+                request = request->next;
+            }
+            if (request != nullptr) {
+                waiter.request = request;
+                Enlist(waiter);
+                enlisted = true;
+            }
+        }
+        if (!enlisted) {
+            // Either it has just ended, or it never ran here.
+            return !IsRunning(record);
+        }
+        Await(waiter);
+    }
+    return true;
+}
+
+void OpenFile::AwaitIdle() {
+    {
+        const std::lock_guard guard(lock);
+        if (IsIdle()) {
+            return;
+        }
+    }
+    Waiter waiter;
+    GiveEvent(waiter);
+    {
+        const std::lock_guard guard(lock);
+        if (IsIdle()) {
+            return;
+        }
+        Enlist(waiter);
+    }
+    Await(waiter);
+}
+
+void OpenFile::GiveEvent(Waiter& waiter) {
+    {
+        const std::lock_guard guard(lock);
+        waiter.event = std::move(spareEvent);
+    }
+    if (!waiter.event) {
+        waiter.event = OwnedHandle(MakeAutoResetEvent());
+    }
+}
+
+void OpenFile::Enlist(Waiter& waiter) {
+    waiter.next = waiters;
+    waiters = &waiter;
+}
+
+void OpenFile::Await(Waiter& waiter) {
+    const bool signalled = waiter.event && Wait(waiter.event.Get(), Infinite) == WaitResult::Signalled;
+    while (!signalled && !waiter.released.load(std::memory_order_acquire)) {
+        SleepMilliseconds(1);
+    }
+    if (signalled) {
+        const std::lock_guard guard(lock);
+        if (!spareEvent) {
+            spareEvent = std::move(waiter.event);
+        }
+    }
+}
+
+OpenFile::Waiter* OpenFile::TakeReleased() {
+    Waiter* released = nullptr;
+    for (Waiter** link = &waiters; *link != nullptr;) {
+        Waiter* const waiter = *link;
+        if (waiter->request != nullptr ? waiter->request->ended : IsIdle()) {
+            *link = waiter->next;
+            waiter->next = released;
+            released = waiter;
+        } else {
+            link = &waiter->next;
+        }
+    }
+    return released;
+}
+
+void OpenFile::Release(Waiter* first) {
+    while (first != nullptr) {
+        Waiter& waiter = *std::exchange(first, first->next);
+        const Handle event = waiter.event.Get();
+        waiter.released.store(true, std::memory_order_release);
+        if (event != NoHandle) {
+            SignalSurely(event);
+        }
+    }
+}
+
+}  // namespace Varnholt::Platform::Drivers

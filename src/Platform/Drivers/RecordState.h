@@ -1,0 +1,30 @@
+#pragma once
+
+#include <cstdint>
+
+#include "Platform/DeviceFiles.h"
+
+/// What an overlapped record says of its request. `internal` is the word that starter, completion and asker
+/// share: a marker while the request runs, its outcome afterwards.
+namespace Varnholt::Platform::Drivers {
+
+/// True while the request runs. The caller may do what it likes with the record, its event and the buffer as
+/// soon as this answers false.
+bool IsRunning(const Overlapped& record);
+
+/// The outcome and bytes of a record that is not running.
+ErrorCode OutcomeOf(const Overlapped& record, std::uint32_t& transferred);
+
+/// Marks the record as running and resets its event.
+void MarkRunning(Overlapped& record);
+
+/// Stores how the request ended and signals the event. The record is not touched afterwards.
+void MarkEnded(Overlapped& record, ErrorCode code, std::uint32_t transferred);
+
+/// Signals an event that somebody may wait for without limit.
+void SignalSurely(Handle event);
+
+/// The record of a request that was never started: a failure without a signal.
+void MarkNotStarted(Overlapped& record, ErrorCode code);
+
+}  // namespace Varnholt::Platform::Drivers

@@ -1,0 +1,108 @@
+#include "Platform/Drivers/SharedDevice.h"
+
+#include <algorithm>
+#include <new>
+#include <utility>
+
+namespace Varnholt::Platform::Drivers {
+namespace {
+
+std::uint32_t BitOf(std::uint8_t endpoint) {
+    const unsigned direction = (endpoint & 0x80U) != 0 ? 16 : 0;
+    return 1U << ((endpoint & 0x0FU) + direction);
+}
+
+}  // namespace
+
+SharedDevice::SharedDevice(Usb::UsbBus& usbBus, std::string nameOnBus)
+    : bus(usbBus), name(std::move(nameOnBus)) {}
+
+ErrorCode SharedDevice::Claim() {
+    const CriticalSection::Holder holder(setup);
+    if (claims == 0) {
+        if (!opened) {
+            ErrorCode error = Errors::Success;
+            opened = bus.Open(name, error);
+            if (!opened) {
+                return Note(error != Errors::Success ? error : Errors::GeneralFailure);
+            }
+            usb.store(opened.get(), std::memory_order_release);
+        }
+        const ErrorCode code = Note(opened->Claim());
+        if (code != Errors::Success) {
+            return code;
+        }
+    }
+    ++claims;
+    return Errors::Success;
+}
+
+void SharedDevice::Unclaim() {
+    const CriticalSection::Holder holder(setup);
+    if (claims > 0 && --claims == 0) {
+        opened->Release();
+    }
+}
+
+bool SharedDevice::IsClaimed() {
+    const CriticalSection::Holder holder(setup);
+    return claims > 0;
+}
+
+bool SharedDevice::HasEndpoint(std::uint8_t endpoint) {
+    const CriticalSection::Holder holder(setup);
+    if (!opened) {
+        return false;
+    }
+    const auto endpoints = opened->Endpoints();
+    return std::any_of(endpoints.begin(), endpoints.end(),
+                       [endpoint](const Usb::EndpointInfo& info) { return info.address == endpoint; });
+}
+
+ErrorCode SharedDevice::Submit(Usb::Transfer& transfer) {
+    if ((halted.load(std::memory_order_acquire) & BitOf(transfer.endpoint)) != 0) {
+        const ErrorCode code = ClearHalt(transfer.endpoint);
+        if (code != Errors::Success) {
+            return code;
+        }
+    }
+    try {
+        return Note(usb.load(std::memory_order_acquire)->Submit(transfer));
+    } catch (const std::bad_alloc&) {
+        return Errors::NotEnoughMemory;
+    }
+}
+
+void SharedDevice::Cancel(Usb::Transfer& transfer) {
+    usb.load(std::memory_order_acquire)->Cancel(transfer);
+}
+
+void SharedDevice::Learn(const Usb::Transfer& transfer) {
+    if (transfer.status == Usb::TransferStatus::Stalled && transfer.endpoint != 0) {
+        halted.fetch_or(BitOf(transfer.endpoint), std::memory_order_release);
+    } else if (transfer.status == Usb::TransferStatus::DeviceGone) {
+        gone.store(true, std::memory_order_relaxed);
+    }
+}
+
+ErrorCode SharedDevice::ClearHalt(std::uint8_t endpoint) {
+    // Whoever comes second must not pass before the first has cleared the halt, or its transfer stalls again.
+    const CriticalSection::Holder holder(setup);
+    if ((halted.load(std::memory_order_acquire) & BitOf(endpoint)) == 0) {
+        return Errors::Success;
+    }
+    const ErrorCode code = Note(opened->ClearHalt(endpoint));
+    if (code == Errors::Success) {
+        halted.fetch_and(~BitOf(endpoint), std::memory_order_release);
+    }
+    return code;
+}
+
+ErrorCode SharedDevice::Note(ErrorCode code) {
+    if (code == Errors::DeviceNotConnected) {
+        gone.store(true, std::memory_order_relaxed);
+    }
+    return code;
+}
+
+}  // namespace Varnholt::Platform::Drivers

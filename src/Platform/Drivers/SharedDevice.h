@@ -1,0 +1,53 @@
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <memory>
+#include <string>
+
+#include "Platform/Usb/UsbDevice.h"
+#include "Platform/WaitableObjects.h"
+
+namespace Varnholt::Platform::Drivers {
+
+/// The one USB device behind all open files of an instrument. It is opened at the first claim and closed with
+/// the object. All operations may be called from any thread.
+class SharedDevice final {
+  public:
+    SharedDevice(Usb::UsbBus& usbBus, std::string nameOnBus);
+    SharedDevice(const SharedDevice&) = delete;
+    SharedDevice& operator=(const SharedDevice&) = delete;
+
+    /// Takes a share in the claim to the USB device; the first one opens and claims it. May block.
+    ErrorCode Claim();
+    /// Gives one share back; the last releases the device, which stays open.
+    void Unclaim();
+    bool IsClaimed();
+    /// Whether the device, once claimed, has this endpoint.
+    bool HasEndpoint(std::uint8_t endpoint);
+
+    /// Hands a transfer of a claimed device to it, after clearing a halt of its endpoint.
+    ErrorCode Submit(Usb::Transfer& transfer);
+    void Cancel(Usb::Transfer& transfer);
+    /// Remembers what the end of a transfer says about the device. Before the end is made known.
+    void Learn(const Usb::Transfer& transfer);
+
+    /// Known to be unplugged; it does not come back, whatever is plugged in at its place.
+    bool IsGone() const { return gone.load(std::memory_order_relaxed); }
+
+  private:
+    ErrorCode ClearHalt(std::uint8_t endpoint);
+    ErrorCode Note(ErrorCode code);
+
+    Usb::UsbBus& bus;
+    const std::string name;
+
+    CriticalSection setup;  ///< guards opening, the claim and the clearing of halts, all of which may block
+    std::uint32_t claims = 0;                ///< guarded by `setup`
+    std::shared_ptr<Usb::UsbDevice> opened;  ///< guarded by `setup`; once set, set for good
+    std::atomic<Usb::UsbDevice*> usb{nullptr};
+    std::atomic<std::uint32_t> halted{0};  ///< one bit for each endpoint that answered with STALL
+    std::atomic<bool> gone{false};
+};
+
+}  // namespace Varnholt::Platform::Drivers

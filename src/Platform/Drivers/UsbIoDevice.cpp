@@ -1,0 +1,127 @@
+#include "Platform/Drivers/UsbIoDevice.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "Protocol/ByteOrder.h"
+
+namespace Varnholt::Platform::Drivers {
+
+namespace Block = Protocol::UsbIoDriver::ConfigurationBlock;
+namespace Status = Protocol::UsbIoDriver::Status;
+
+ErrorCode UsbIoRefusalOf(ErrorCode usbCode) {
+    switch (usbCode) {
+        case Errors::Success:
+            return Status::Success;
+        case Errors::AccessDenied:
+            return Errors::AccessDenied;
+        case Errors::Busy:
+            return Status::OpenedByOtherProcess;
+        case Errors::FileNotFound:
+        case Errors::DeviceNotConnected:
+            return Status::DeviceRemoved;
+        case Errors::NotEnoughMemory:
+            return Status::NoMemory;
+        default:
+            return Status::RequestFailed;
+    }
+}
+
+UsbIoDevice::UsbIoDevice(std::shared_ptr<SharedDevice> shared) : device(std::move(shared)) {}
+
+UsbIoDevice::~UsbIoDevice() {
+    if (configured) {
+        device->Unclaim();
+    }
+}
+
+ErrorCode UsbIoDevice::Configure(std::span<const std::uint8_t> block) {
+    const CriticalSection::Holder holder(lock);
+    if (device->IsGone()) {
+        return Status::DeviceRemoved;
+    }
+    if (configured) {
+        return Status::AlreadyConfigured;
+    }
+    const std::uint8_t* const entry = block.data() + Block::FirstEntry;
+    const std::uint32_t maximum = Protocol::LoadLittle32(entry + Block::EntryMaximumTransferSize);
+    if (Protocol::LoadLittle16(block.data() + Block::ConfigurationIndex) != 0 ||
+        Protocol::LoadLittle16(block.data() + Block::InterfaceCount) != 1 || maximum == 0) {
+        return Status::InvalidParameter;
+    }
+    if (Protocol::LoadLittle16(entry + Block::EntryInterface) != 0 ||
+        Protocol::LoadLittle16(entry + Block::EntryAlternateSetting) != 0) {
+        return Status::InterfaceNotFound;
+    }
+    const ErrorCode refused = device->Claim();
+    if (refused != Errors::Success) {
+        return UsbIoRefusalOf(refused);
+    }
+    configured = true;
+    maximumTransfer.store(maximum, std::memory_order_relaxed);
+    return Status::Success;
+}
+
+ErrorCode UsbIoDevice::Unconfigure() {
+    const CriticalSection::Holder holder(lock);
+    if (device->IsGone()) {
+        return Status::DeviceRemoved;
+    }
+    if (!bound.empty()) {
+        return Status::OpenPipes;
+    }
+    if (configured) {
+        configured = false;
+        device->Unclaim();
+    }
+    return Status::Success;
+}
+
+ErrorCode UsbIoDevice::Bind(std::uint8_t endpoint, Binding& binding) {
+    const CriticalSection::Holder holder(lock);
+    if (device->IsGone()) {
+        return Status::DeviceRemoved;
+    }
+    if (!configured) {
+        return Status::NotConfigured;
+    }
+    if (binding != 0) {
+        return Status::AlreadyBound;
+    }
+    if (!device->HasEndpoint(endpoint)) {
+        return Status::PipeNotFound;
+    }
+    if (std::find(bound.begin(), bound.end(), endpoint) != bound.end()) {
+        return Status::AlreadyBound;
+    }
+    bound.push_back(endpoint);
+    binding = endpoint;
+    return Status::Success;
+}
+
+void UsbIoDevice::Unbind(Binding& binding) {
+    const CriticalSection::Holder holder(lock);
+    std::erase(bound, binding.load());
+    binding = 0;
+}
+
+ErrorCode UsbIoDevice::ReadParameters(Parameters& target) {
+    const CriticalSection::Holder holder(lock);
+    if (device->IsGone()) {
+        return Status::DeviceRemoved;
+    }
+    target = parameters;
+    return Status::Success;
+}
+
+ErrorCode UsbIoDevice::WriteParameters(const Parameters& source) {
+    const CriticalSection::Holder holder(lock);
+    if (device->IsGone()) {
+        return Status::DeviceRemoved;
+    }
+    parameters = source;
+    return Status::Success;
+}
+
+}  // namespace Varnholt::Platform::Drivers

@@ -1,0 +1,196 @@
+#include "Platform/Drivers/UsbIoDriverFile.h"
+
+#include <algorithm>
+#include <array>
+#include <limits>
+#include <utility>
+
+#include "Protocol/ByteOrder.h"
+#include "Protocol/Instrument.h"
+#include "Protocol/UsbIoDriver.h"
+
+namespace Varnholt::Platform::Drivers {
+namespace {
+
+namespace UsbIo = Protocol::UsbIoDriver;
+namespace Status = Protocol::UsbIoDriver::Status;
+
+/// The bits of a request type that name neither direction nor type nor one of the four known recipients.
+constexpr std::uint8_t ReservedTypeBits = 0x1C;
+
+struct ControlShape {
+    std::uint32_t code;
+    std::size_t inputSize;   ///< at least
+    std::size_t outputSize;  ///< at least
+};
+
+constexpr std::array<ControlShape, 9> ControlShapes{{
+    {UsbIo::Control::SetConfiguration, UsbIo::ConfigurationBlock::Size, 0},
+    {UsbIo::Control::UnconfigureDevice, 0, 0},
+    {UsbIo::Control::ClassOrVendorInRequest, UsbIo::RequestBlock::Size, 0},
+    {UsbIo::Control::ClassOrVendorOutRequest, UsbIo::RequestBlock::Size, 0},
+    {UsbIo::Control::GetDeviceParameters, 0, UsbIo::DeviceParametersSize},
+    {UsbIo::Control::SetDeviceParameters, UsbIo::DeviceParametersSize, 0},
+    {UsbIo::Control::GetDriverInfo, 0, UsbIo::DriverInfoSize},
+    {UsbIo::Control::BindPipe, 1, 0},
+    {UsbIo::Control::AbortPipe, 0, 0},
+}};
+
+ErrorCode CheckShape(std::uint32_t code, std::size_t inputSize, std::size_t outputSize) {
+    const auto shape = std::find_if(ControlShapes.begin(), ControlShapes.end(),
+                                    [code](const ControlShape& candidate) { return candidate.code == code; });
+    if (shape == ControlShapes.end()) {
+        return Status::ControlNotSupported;
+    }
+    if (inputSize < shape->inputSize) {
+        return Status::InputBufferTooSmall;
+    }
+    return outputSize < shape->outputSize ? Status::OutputBufferTooSmall : Status::Success;
+}
+
+Decision Answer(ErrorCode status, std::size_t bytes = 0) {
+    return status == Status::Success ? Decision::Done(static_cast<std::uint32_t>(bytes))
+                                     : Decision::Refuse(status);
+}
+
+Decision DriverInfo(std::span<std::uint8_t> output) {
+    std::fill_n(output.begin(), UsbIo::DriverInfoSize, std::uint8_t{0});
+    Protocol::StoreLittle16(output.data(), UsbIo::InterfaceVersion);
+    return Decision::Done(UsbIo::DriverInfoSize);
+}
+
+}  // namespace
+
+UsbIoDriverFile::UsbIoDriverFile(std::shared_ptr<UsbIoDevice> usbIoDevice,
+                                 EndpointCanceller& endpointCanceller)
+    : DriverFile(usbIoDevice->Shared()), usbIo(std::move(usbIoDevice)), canceller(endpointCanceller) {}
+
+UsbIoDriverFile::~UsbIoDriverFile() {
+    if (binding != 0) {
+        usbIo->Unbind(binding);
+    }
+}
+
+Decision UsbIoDriverFile::Read(Usb::Transfer& transfer) {
+    return Move(transfer, true);
+}
+
+Decision UsbIoDriverFile::Write(Usb::Transfer& transfer) {
+    return Move(transfer, false);
+}
+
+Decision UsbIoDriverFile::Move(Usb::Transfer& transfer, bool in) const {
+    transfer.endpoint = binding.load(std::memory_order_relaxed);
+    if (transfer.endpoint == 0) {
+        return Decision::Refuse(Status::NotBound);
+    }
+    if (transfer.IsIn() != in) {
+        return Decision::Refuse(Status::InvalidDirection);
+    }
+    if (transfer.length > usbIo->MaximumTransfer()) {
+        return Decision::Refuse(Status::InvalidParameter);
+    }
+    return in && transfer.length == 0 ? Decision::Done(0) : Decision::Send();
+}
+
+Decision UsbIoDriverFile::Control(std::uint32_t code, std::span<const std::uint8_t> input,
+                                  std::span<std::uint8_t> output, Usb::Transfer& transfer) {
+    const ErrorCode misshapen = CheckShape(code, input.size(), output.size());
+    if (misshapen != Status::Success) {
+        return Decision::Refuse(misshapen);
+    }
+    switch (code) {
+        case UsbIo::Control::GetDriverInfo:
+            return DriverInfo(output);
+        case UsbIo::Control::SetConfiguration:
+            return Answer(usbIo->Configure(input));
+        case UsbIo::Control::UnconfigureDevice:
+            return Answer(usbIo->Unconfigure());
+        case UsbIo::Control::GetDeviceParameters: {
+            UsbIoDevice::Parameters parameters{};
+            const ErrorCode status = usbIo->ReadParameters(parameters);
+            if (status == Status::Success) {
+                std::copy(parameters.begin(), parameters.end(), output.begin());
+            }
+            return Answer(status, parameters.size());
+        }
+        case UsbIo::Control::SetDeviceParameters: {
+            UsbIoDevice::Parameters parameters{};
+            std::copy_n(input.begin(), parameters.size(), parameters.begin());
+            return Answer(usbIo->WriteParameters(parameters));
+        }
+        case UsbIo::Control::BindPipe:
+            return Answer(usbIo->Bind(input[0], binding));
+        case UsbIo::Control::AbortPipe:
+            return AbortPipe();
+        default:
+            return VendorRequest(code == UsbIo::Control::ClassOrVendorInRequest, input, output, transfer);
+    }
+}
+
+Decision UsbIoDriverFile::VendorRequest(bool in, std::span<const std::uint8_t> block,
+                                        std::span<std::uint8_t> data, Usb::Transfer& transfer) {
+    namespace Field = UsbIo::RequestBlock;
+    if (Device().IsGone()) {
+        return Decision::Refuse(Status::DeviceRemoved);
+    }
+    if (Protocol::LoadLittle32(block.data() + Field::Type) != Field::TypeVendor) {
+        return Decision::Refuse(Status::InvalidType);
+    }
+    if (Protocol::LoadLittle32(block.data() + Field::Recipient) != 0) {
+        return Decision::Refuse(Status::InvalidRecipient);
+    }
+    const std::uint8_t reserved = block[Field::ReservedBits];
+    if ((reserved & ~ReservedTypeBits) != 0 || data.size() > std::numeric_limits<std::uint16_t>::max()) {
+        return Decision::Refuse(Status::InvalidParameter);
+    }
+    if (!Device().IsClaimed()) {
+        return Decision::Refuse(Status::NotConfigured);
+    }
+    transfer.endpoint = 0;
+    transfer.setup.requestType =
+        static_cast<std::uint8_t>((in ? Protocol::VendorIn : Protocol::VendorOut) | reserved);
+    transfer.setup.request = block[Field::Request];
+    transfer.setup.value = Protocol::LoadLittle16(block.data() + Field::Value);
+    transfer.setup.index = Protocol::LoadLittle16(block.data() + Field::Index);
+    transfer.setup.length = static_cast<std::uint16_t>(data.size());
+    transfer.data = data.data();
+    transfer.length = transfer.setup.length;
+    return Decision::Send();
+}
+
+Decision UsbIoDriverFile::AbortPipe() {
+    if (Device().IsGone()) {
+        return Decision::Refuse(Status::DeviceRemoved);
+    }
+    const std::uint8_t endpoint = binding.load();
+    if (endpoint == 0) {
+        return Decision::Refuse(Status::NotBound);
+    }
+    canceller.CancelEndpoint(Device(), endpoint);
+    return Decision::Done(0);
+}
+
+ErrorCode UsbIoDriverFile::OutcomeOf(Usb::TransferStatus status) const {
+    switch (status) {
+        case Usb::TransferStatus::Completed:
+            return Status::Success;
+        case Usb::TransferStatus::Stalled:
+            return Status::EndpointHalted;
+        case Usb::TransferStatus::IoError:
+            return Status::TransactionError;
+        case Usb::TransferStatus::Overflow:
+            return Status::BabbleDetected;
+        case Usb::TransferStatus::Cancelled:
+            return Status::Cancelled;
+        case Usb::TransferStatus::DeviceGone:
+            return Status::DeviceRemoved;
+    }
+    return Status::RequestFailed;
+}
+
+ErrorCode UsbIoDriverFile::RefusalOf(ErrorCode usbCode) const {
+    return UsbIoRefusalOf(usbCode);
+}
+
+}  // namespace Varnholt::Platform::Drivers

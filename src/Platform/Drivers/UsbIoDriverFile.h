@@ -1,0 +1,45 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <span>
+
+#include "Platform/Drivers/DriverFile.h"
+#include "Platform/Drivers/UsbIoDevice.h"
+
+namespace Varnholt::Platform::Drivers {
+
+/// A file of the USBIO driver: takes the driver's device controls, and reads or writes once it is bound to an
+/// endpoint. Opening it does not touch the USB device, so that any number of processes can list instruments
+/// that one of them uses; configuring claims it.
+///
+/// A vendor request needs a claimed device, not a bound pipe. A read of no bytes completes at once and
+/// reaches no endpoint; a write of no bytes is sent as an empty packet. The driver clears the halt of an
+/// endpoint before the next transfer on it. Once the device is known to be gone every control but the driver
+/// information ends with `Status::DeviceRemoved`.
+class UsbIoDriverFile final : public DriverFile {
+  public:
+    UsbIoDriverFile(std::shared_ptr<UsbIoDevice> usbIoDevice, EndpointCanceller& endpointCanceller);
+    /// Unbinds.
+    ~UsbIoDriverFile() override;
+
+    Decision Read(Usb::Transfer& transfer) override;
+    Decision Write(Usb::Transfer& transfer) override;
+    Decision Control(std::uint32_t code, std::span<const std::uint8_t> input, std::span<std::uint8_t> output,
+                     Usb::Transfer& transfer) override;
+
+    ErrorCode OutcomeOf(Usb::TransferStatus status) const override;
+    ErrorCode RefusalOf(ErrorCode usbCode) const override;
+
+  private:
+    Decision Move(Usb::Transfer& transfer, bool in) const;
+    Decision VendorRequest(bool in, std::span<const std::uint8_t> block, std::span<std::uint8_t> data,
+                           Usb::Transfer& transfer);
+    Decision AbortPipe();
+
+    const std::shared_ptr<UsbIoDevice> usbIo;
+    EndpointCanceller& canceller;
+    UsbIoDevice::Binding binding{0};
+};
+
+}  // namespace Varnholt::Platform::Drivers
