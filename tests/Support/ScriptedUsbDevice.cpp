@@ -1,0 +1,542 @@
+#include "Support/ScriptedUsbDevice.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <sstream>
+
+#include "Platform/EventScheduler.h"
+
+namespace Varnholt::Tests {
+
+using Platform::ErrorCode;
+using Platform::Usb::SetupPacket;
+using Platform::Usb::Transfer;
+using Platform::Usb::TransferStatus;
+namespace Errors = Platform::Errors;
+
+namespace {
+
+std::string DescribeTransfer(std::uint8_t endpoint, const SetupPacket& setup, bool isIn,
+                             const std::uint8_t* data, std::uint32_t length) {
+    std::ostringstream text;
+    text << (isIn ? "IN  " : "OUT ") << Hex(&endpoint, 1);
+    if (endpoint == 0) {
+        const std::uint8_t bytes[] = {setup.requestType,
+                                      setup.request,
+                                      static_cast<std::uint8_t>(setup.value),
+                                      static_cast<std::uint8_t>(setup.value >> 8),
+                                      static_cast<std::uint8_t>(setup.index),
+                                      static_cast<std::uint8_t>(setup.index >> 8),
+                                      static_cast<std::uint8_t>(setup.length),
+                                      static_cast<std::uint8_t>(setup.length >> 8)};
+        text << " setup " << Hex(bytes, sizeof bytes);
+    }
+    text << " length " << length;
+    if (!isIn && length > 0) {
+        text << " data " << Hex(data, length);
+    }
+    return text.str();
+}
+
+std::string DescribeTransfer(const Transfer& transfer) {
+    return DescribeTransfer(transfer.endpoint, transfer.setup, transfer.IsIn(), transfer.data,
+                            transfer.length);
+}
+
+std::string DescribeHaltCleared(std::uint8_t endpoint) {
+    return "clear halt of " + Hex(&endpoint, 1);
+}
+
+bool IsIn(const Exchange& row) {
+    return row.endpoint == 0 ? row.setup.IsIn() : (row.endpoint & 0x80) != 0;
+}
+
+}  // namespace
+
+Bytes Counting(std::size_t count, unsigned first) {
+    Bytes bytes(count);
+    std::generate(bytes.begin(), bytes.end(), [&first] { return static_cast<std::uint8_t>(first++); });
+    return bytes;
+}
+
+std::string Hex(const std::uint8_t* bytes, std::size_t count) {
+    constexpr const char* Digits = "0123456789ABCDEF";
+    std::string text;
+    for (std::size_t i = 0; i < count; ++i) {
+        text += i > 0 ? " " : "";
+        text += Digits[bytes[i] >> 4];
+        text += Digits[bytes[i] & 0x0F];
+    }
+    return text;
+}
+
+Exchange Exchange::Ends(TransferStatus how, std::uint32_t bytes) const {
+    Exchange row = *this;
+    row.status = how;
+    row.moved = bytes;
+    return row;
+}
+
+Exchange Exchange::Refused(ErrorCode code) const {
+    Exchange row = *this;
+    row.refusal = code;
+    return row;
+}
+
+Exchange Exchange::AtOnce() const {
+    Exchange row = *this;
+    row.when = When::AtOnce;
+    return row;
+}
+
+Exchange Exchange::After(std::uint64_t microseconds) const {
+    Exchange row = *this;
+    row.when = When::Later;
+    row.delay = microseconds;
+    return row;
+}
+
+Exchange Exchange::OnDemand() const {
+    Exchange row = *this;
+    row.when = When::OnDemand;
+    return row;
+}
+
+Exchange Exchange::MovesWhenCancelled(std::uint32_t bytes) const {
+    Exchange row = *this;
+    row.movedWhenCancelled = bytes;
+    return row;
+}
+
+std::string Exchange::Describe() const {
+    return kind == Kind::ClearHalt ? DescribeHaltCleared(endpoint)
+                                   : DescribeTransfer(endpoint, setup, IsIn(*this), sent.data(), length);
+}
+
+Exchange VendorOut(std::uint8_t request, Bytes data, std::uint16_t value, std::uint16_t index) {
+    Exchange row;
+    row.length = static_cast<std::uint32_t>(data.size());
+    row.moved = row.length;
+    row.setup = {Protocol::VendorOut, request, value, index, static_cast<std::uint16_t>(data.size())};
+    row.sent = std::move(data);
+    return row;
+}
+
+Exchange VendorIn(std::uint8_t request, std::uint16_t length, Bytes answer, std::uint16_t value,
+                  std::uint16_t index) {
+    Exchange row = BulkIn(length, std::move(answer), 0);
+    row.setup = {Protocol::VendorIn, request, value, index, length};
+    return row;
+}
+
+Exchange BulkOut(Bytes data, std::uint8_t endpoint) {
+    Exchange row;
+    row.endpoint = endpoint;
+    row.length = static_cast<std::uint32_t>(data.size());
+    row.moved = row.length;
+    row.sent = std::move(data);
+    return row;
+}
+
+Exchange BulkIn(std::uint32_t length, Bytes answer, std::uint8_t endpoint) {
+    Exchange row;
+    row.endpoint = endpoint;
+    row.length = length;
+    row.status = answer.size() > length ? TransferStatus::Overflow : TransferStatus::Completed;
+    row.moved = std::min(length, static_cast<std::uint32_t>(answer.size()));
+    row.received = std::move(answer);
+    return row;
+}
+
+Exchange HaltCleared(std::uint8_t endpoint) {
+    Exchange row;
+    row.kind = Exchange::Kind::ClearHalt;
+    row.endpoint = endpoint;
+    return row;
+}
+
+ScriptedUsbDevice::ScriptedUsbDevice(std::vector<Exchange> rows, Pace pace)
+    : script(std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end())), defaultPace(pace) {}
+
+ScriptedUsbDevice::~ScriptedUsbDevice() {
+    for (const std::uint64_t event : events) {
+        Platform::ClockScheduler().Forget(event);
+    }
+    Unplug();
+    ExpectFinished();
+}
+
+void ScriptedUsbDevice::Expect(std::vector<Exchange> rows) {
+    const std::lock_guard guard(lock);
+    script.insert(script.end(), std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end()));
+}
+
+void ScriptedUsbDevice::ExpectFinished() {
+    const std::lock_guard guard(lock);
+    if (!script.empty() && !failed) {
+        failed = true;
+        ADD_FAILURE() << script.size() << " rows of the script were not played; the next, row " << played
+                      << ":\n  expected: " << script.front().Describe();
+    }
+}
+
+void ScriptedUsbDevice::LeaveToTest(std::uint8_t endpoint) {
+    const std::lock_guard guard(lock);
+    leftToTest.insert(endpoint);
+}
+
+void ScriptedUsbDevice::Send(std::uint8_t endpoint, Bytes data) {
+    {
+        const std::lock_guard guard(lock);
+        const auto oldest =
+            std::find_if(running.begin(), running.end(), [endpoint](const Running& candidate) {
+                return candidate.transfer->endpoint == endpoint && !candidate.ready;
+            });
+        if (oldest == running.end()) {
+            unsent.emplace_back(endpoint, std::move(data));
+            return;
+        }
+        oldest->row = BulkIn(oldest->transfer->length, std::move(data), endpoint);
+        oldest->ready = true;
+    }
+    CompleteReady(endpoint);
+}
+
+bool ScriptedUsbDevice::CompleteNext(std::uint8_t endpoint) {
+    {
+        const std::lock_guard guard(lock);
+        const auto oldest =
+            std::find_if(running.begin(), running.end(), [endpoint](const Running& candidate) {
+                return candidate.transfer->endpoint == endpoint && !candidate.ready;
+            });
+        if (oldest == running.end()) {
+            return false;
+        }
+        oldest->ready = true;
+    }
+    CompleteReady(endpoint);
+    return true;
+}
+
+void ScriptedUsbDevice::CancelLater(bool later) {
+    const std::lock_guard guard(lock);
+    cancelLater = later;
+}
+
+void ScriptedUsbDevice::Unplug() {
+    std::deque<Running> ended;
+    {
+        const std::lock_guard guard(lock);
+        gone = true;
+        ended.swap(running);
+    }
+    for (Running& transfer : ended) {
+        transfer.row = transfer.row.Ends(TransferStatus::DeviceGone);
+        Finish(transfer);
+    }
+}
+
+void ScriptedUsbDevice::AnswerClaim(ErrorCode code) {
+    const std::lock_guard guard(lock);
+    claimAnswer = code;
+}
+
+bool ScriptedUsbDevice::IsClaimed() const {
+    const std::lock_guard guard(lock);
+    return claimed;
+}
+
+bool ScriptedUsbDevice::IsOpen() const {
+    const std::lock_guard guard(lock);
+    return handles > 0;
+}
+
+std::uint32_t ScriptedUsbDevice::TimesOpened() const {
+    const std::lock_guard guard(lock);
+    return timesOpened;
+}
+
+std::uint32_t ScriptedUsbDevice::TimesClaimed() const {
+    const std::lock_guard guard(lock);
+    return timesClaimed;
+}
+
+std::size_t ScriptedUsbDevice::Pending(std::uint8_t endpoint) const {
+    const std::lock_guard guard(lock);
+    return static_cast<std::size_t>(std::count_if(
+        running.begin(), running.end(),
+        [endpoint](const Running& candidate) { return candidate.transfer->endpoint == endpoint; }));
+}
+
+std::vector<Platform::Usb::EndpointInfo> ScriptedUsbDevice::Endpoints() {
+    return {{Protocol::BulkOutEndpoint, 2, 512},
+            {Protocol::BulkInEndpoint, 2, 512},
+            {Protocol::InterruptInEndpoint, 3, 8}};
+}
+
+ErrorCode ScriptedUsbDevice::Claim() {
+    const std::lock_guard guard(lock);
+    const ErrorCode answer = gone ? Errors::DeviceNotConnected : claimAnswer;
+    if (answer == Errors::Success) {
+        claimed = true;
+        ++timesClaimed;
+    }
+    return answer;
+}
+
+void ScriptedUsbDevice::Release() {
+    const std::lock_guard guard(lock);
+    claimed = false;
+}
+
+ErrorCode ScriptedUsbDevice::Submit(Transfer& transfer) {
+    const std::uint8_t endpoint = transfer.endpoint;
+    std::uint64_t number = 0;
+    std::uint64_t delay = 0;
+    {
+        const std::lock_guard guard(lock);
+        if (gone) {
+            return Errors::DeviceNotConnected;
+        }
+        number = ++lastNumber;
+        Running submitted{number, &transfer, {}, false, false};
+        Exchange::When when = Exchange::When::AtOnce;
+        if (leftToTest.contains(endpoint)) {
+            const auto waiting =
+                std::find_if(unsent.begin(), unsent.end(),
+                             [endpoint](const auto& candidate) { return candidate.first == endpoint; });
+            when = Exchange::When::OnDemand;
+            if (waiting != unsent.end()) {
+                submitted.row = BulkIn(transfer.length, std::move(waiting->second), endpoint);
+                unsent.erase(waiting);
+                when = Exchange::When::AtOnce;
+            }
+        } else if (script.empty() || !Matches(script.front(), transfer)) {
+            Mismatch(DescribeTransfer(transfer));
+            submitted.row.status = TransferStatus::Stalled;
+        } else {
+            submitted.row = std::move(script.front());
+            script.pop_front();
+            ++played;
+            if (submitted.row.refusal != Errors::Success) {
+                return submitted.row.refusal;
+            }
+            when = submitted.row.when;
+            delay = submitted.row.delay;
+            if (when == Exchange::When::AsPaced) {
+                when = defaultPace == Pace::AtOnce  ? Exchange::When::AtOnce
+                       : defaultPace == Pace::Later ? Exchange::When::Later
+                                                    : Exchange::When::OnDemand;
+            }
+        }
+        submitted.ready = when == Exchange::When::AtOnce;
+        running.push_back(std::move(submitted));
+        if (when == Exchange::When::OnDemand) {
+            return Errors::Success;
+        }
+        if (when == Exchange::When::AtOnce) {
+            number = 0;
+        }
+    }
+    if (number == 0) {
+        CompleteReady(endpoint);
+    } else {
+        CompleteLater(number, delay);
+    }
+    return Errors::Success;
+}
+
+void ScriptedUsbDevice::Cancel(Transfer& transfer) {
+    const std::uint8_t endpoint = transfer.endpoint;
+    Running ended{};
+    bool later = false;
+    {
+        const std::lock_guard guard(lock);
+        const auto found =
+            std::find_if(running.begin(), running.end(), [&transfer](const Running& candidate) {
+                return candidate.transfer == &transfer && !candidate.cancelled;
+            });
+        if (found == running.end()) {
+            return;
+        }
+        found->row = found->row.Ends(TransferStatus::Cancelled, found->row.movedWhenCancelled);
+        found->cancelled = true;
+        ended = *found;
+        later = cancelLater;
+        if (!later) {
+            running.erase(found);
+        }
+    }
+    if (later) {
+        CompleteLater(ended.number, 0);
+    } else {
+        Finish(ended);
+        CompleteReady(endpoint);
+    }
+}
+
+ErrorCode ScriptedUsbDevice::ClearHalt(std::uint8_t endpoint) {
+    const std::lock_guard guard(lock);
+    if (gone) {
+        return Errors::DeviceNotConnected;
+    }
+    if (script.empty() || script.front().kind != Exchange::Kind::ClearHalt ||
+        script.front().endpoint != endpoint) {
+        Mismatch(DescribeHaltCleared(endpoint));
+        return Errors::Success;
+    }
+    const ErrorCode answer = script.front().refusal;
+    script.pop_front();
+    ++played;
+    if (answer == Errors::Success) {
+        halted.erase(endpoint);
+    }
+    return answer;
+}
+
+std::shared_ptr<Platform::Usb::UsbDevice> ScriptedUsbDevice::OpenHandle(
+    const std::shared_ptr<ScriptedUsbDevice>& device) {
+    const std::lock_guard guard(device->lock);
+    ++device->handles;
+    ++device->timesOpened;
+    return {device.get(), [device](Platform::Usb::UsbDevice*) {
+                const std::lock_guard closing(device->lock);
+                if (--device->handles == 0) {
+                    device->claimed = false;
+                }
+                EXPECT_TRUE(device->handles > 0 || device->running.empty())
+                    << "the device was closed while transfers ran";
+            }};
+}
+
+bool ScriptedUsbDevice::Matches(const Exchange& row, const Transfer& transfer) const {
+    return row.kind == Exchange::Kind::Transfer && row.endpoint == transfer.endpoint &&
+           !halted.contains(transfer.endpoint) && row.length == transfer.length &&
+           (row.endpoint != 0 || row.setup == transfer.setup) &&
+           (IsIn(row) || std::equal(row.sent.begin(), row.sent.end(), transfer.data));
+}
+
+void ScriptedUsbDevice::Mismatch(const std::string& actual) {
+    // One difference makes all that follow differ.
+    if (!failed) {
+        failed = true;
+        ADD_FAILURE() << "row " << played << " of the script differs\n  expected: "
+                      << (script.empty() ? "nothing more" : script.front().Describe())
+                      << "\n  actual:   " << actual << (halted.empty() ? "" : " (an endpoint is halted)");
+    }
+}
+
+void ScriptedUsbDevice::CompleteReady(std::uint8_t endpoint) {
+    for (;;) {
+        Running ended{};
+        {
+            const std::lock_guard guard(lock);
+            const auto oldest =
+                std::find_if(running.begin(), running.end(), [endpoint](const Running& candidate) {
+                    return candidate.transfer->endpoint == endpoint && !candidate.cancelled;
+                });
+            if (oldest == running.end() || !oldest->ready) {
+                return;
+            }
+            ended = std::move(*oldest);
+            running.erase(oldest);
+            if (ended.row.status == TransferStatus::Stalled && endpoint != 0 && !failed) {
+                halted.insert(endpoint);
+            }
+        }
+        Finish(ended);
+    }
+}
+
+void ScriptedUsbDevice::CompleteLater(std::uint64_t number, std::uint64_t delay) {
+    auto& scheduler = Platform::ClockScheduler();
+    const auto event = scheduler.CallAt(scheduler.Now() + delay, [this, number] {
+        Running ended{};
+        std::uint8_t endpoint = 0;
+        {
+            const std::lock_guard guard(lock);
+            const auto found =
+                std::find_if(running.begin(), running.end(),
+                             [number](const Running& candidate) { return candidate.number == number; });
+            if (found == running.end()) {
+                return;
+            }
+            endpoint = found->transfer->endpoint;
+            found->ready = true;
+            if (found->cancelled) {
+                ended = std::move(*found);
+                running.erase(found);
+            }
+        }
+        if (ended.transfer != nullptr) {
+            Finish(ended);
+        }
+        CompleteReady(endpoint);
+    });
+    const std::lock_guard guard(lock);
+    events.push_back(event);
+}
+
+void ScriptedUsbDevice::Finish(const Running& completed) {
+    Transfer& transfer = *completed.transfer;
+    const Exchange& row = completed.row;
+    if (transfer.IsIn()) {
+        const std::size_t copied = std::min<std::size_t>({row.moved, row.received.size(), transfer.length});
+        std::copy_n(row.received.begin(), copied, transfer.data);
+    }
+    transfer.status = row.status;
+    transfer.actualLength = std::min(row.moved, transfer.length);
+    transfer.client->TransferCompleted(transfer);
+}
+
+void ScriptedBus::Plug(const std::string& name, std::shared_ptr<ScriptedUsbDevice> device) {
+    const std::lock_guard guard(lock);
+    devices.emplace_back(name, std::move(device));
+}
+
+void ScriptedBus::Unplug(const std::string& name) {
+    std::shared_ptr<ScriptedUsbDevice> unplugged;
+    {
+        const std::lock_guard guard(lock);
+        const auto found = std::find_if(devices.begin(), devices.end(),
+                                        [&name](const auto& device) { return device.first == name; });
+        if (found == devices.end()) {
+            return;
+        }
+        unplugged = std::move(found->second);
+        devices.erase(found);
+    }
+    unplugged->Unplug();
+}
+
+void ScriptedBus::AnswerOpen(ErrorCode code) {
+    const std::lock_guard guard(lock);
+    openAnswer = code;
+}
+
+std::vector<std::string> ScriptedBus::List() {
+    const std::lock_guard guard(lock);
+    std::vector<std::string> names;
+    for (const auto& device : devices) {
+        names.push_back(device.first);
+    }
+    return names;
+}
+
+std::shared_ptr<Platform::Usb::UsbDevice> ScriptedBus::Open(const std::string& name, ErrorCode& error) {
+    const std::lock_guard guard(lock);
+    error = openAnswer;
+    if (error != Errors::Success) {
+        return nullptr;
+    }
+    const auto found = std::find_if(devices.begin(), devices.end(),
+                                    [&name](const auto& device) { return device.first == name; });
+    if (found == devices.end()) {
+        error = Errors::FileNotFound;
+        return nullptr;
+    }
+    return ScriptedUsbDevice::OpenHandle(found->second);
+}
+
+}  // namespace Varnholt::Tests

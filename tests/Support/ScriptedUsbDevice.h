@@ -1,0 +1,176 @@
+#pragma once
+
+#include <cstdint>
+#include <deque>
+#include <memory>
+#include <mutex>
+#include <set>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "Platform/Usb/UsbDevice.h"
+#include "Protocol/Instrument.h"
+
+/// A USB device that plays a table: each row is a transfer expected and the answer to it. A transfer that
+/// does not match its row fails the test with both sides as hex.
+namespace Varnholt::Tests {
+
+using Bytes = std::vector<std::uint8_t>;
+
+/// `count` bytes that tell their place: first, first + 1, ...
+Bytes Counting(std::size_t count, unsigned first = 0);
+/// "1F 00 A2"
+std::string Hex(const std::uint8_t* bytes, std::size_t count);
+
+/// One row. Made by the functions below, refined by its members:
+///
+///     VendorOut(0xCA, {0x1F})
+///     BulkIn(256, Counting(256)).After(20'000)
+///     BulkIn(512, Counting(512)).Ends(TransferStatus::Stalled, 100)
+struct Exchange {
+    enum class Kind { Transfer, ClearHalt };
+    enum class When { AsPaced, AtOnce, Later, OnDemand };
+
+    Kind kind = Kind::Transfer;
+    std::uint8_t endpoint = 0;
+    Platform::Usb::SetupPacket setup;  ///< endpoint 0
+    Bytes sent;                        ///< OUT: the data expected
+    std::uint32_t length = 0;          ///< bytes asked for or sent
+
+    Bytes received;  ///< IN: the answer
+    Platform::Usb::TransferStatus status = Platform::Usb::TransferStatus::Completed;
+    std::uint32_t moved = 0;  ///< bytes moved at completion
+    std::uint32_t movedWhenCancelled = 0;
+    Platform::ErrorCode refusal = Platform::Errors::Success;  ///< `Submit` or `ClearHalt` answers this
+    When when = When::AsPaced;
+    std::uint64_t delay = 0;  ///< microseconds, with `When::Later`
+
+    /// Ends with this status after this many bytes.
+    Exchange Ends(Platform::Usb::TransferStatus how, std::uint32_t bytes = 0) const;
+    /// Is not accepted, with this code.
+    Exchange Refused(Platform::ErrorCode code) const;
+    Exchange AtOnce() const;
+    /// Completes that many microseconds after it was submitted, on the clock's scheduler.
+    Exchange After(std::uint64_t microseconds) const;
+    /// Completes when the test says so (`CompleteNext`), or never.
+    Exchange OnDemand() const;
+    /// A cancellation finds that many bytes moved.
+    Exchange MovesWhenCancelled(std::uint32_t bytes) const;
+
+    std::string Describe() const;
+};
+
+Exchange VendorOut(std::uint8_t request, Bytes data, std::uint16_t value = 0, std::uint16_t index = 0);
+Exchange VendorIn(std::uint8_t request, std::uint16_t length, Bytes answer, std::uint16_t value = 0,
+                  std::uint16_t index = 0);
+Exchange BulkOut(Bytes data, std::uint8_t endpoint = Protocol::BulkOutEndpoint);
+/// Also for the interrupt endpoint. An answer shorter than `length` is a short transfer.
+Exchange BulkIn(std::uint32_t length, Bytes answer, std::uint8_t endpoint = Protocol::BulkInEndpoint);
+/// The driver clears the halt of an endpoint.
+Exchange HaltCleared(std::uint8_t endpoint);
+
+/// The order of submission is the order of the table; transfers of one endpoint complete in that order. All
+/// operations may be called from any thread. A device that the test has unplugged refuses everything.
+class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
+  public:
+    /// How rows complete that do not say it themselves.
+    enum class Pace {
+        AtOnce,    ///< inside `Submit`
+        Later,     ///< on the clock's scheduler, as soon as it runs
+        OnDemand,  ///< when the test says so
+    };
+
+    explicit ScriptedUsbDevice(std::vector<Exchange> rows = {}, Pace pace = Pace::AtOnce);
+    /// Fails the test if rows are left.
+    ~ScriptedUsbDevice() override;
+
+    /// Appends rows.
+    void Expect(std::vector<Exchange> rows);
+    /// Fails the test unless every row was played.
+    void ExpectFinished();
+    /// Transfers on this endpoint are no rows: they stay pending until `Send`, a cancellation or the end.
+    void LeaveToTest(std::uint8_t endpoint);
+    /// Answers the oldest transfer on an endpoint left to the test, or the next one.
+    void Send(std::uint8_t endpoint, Bytes data);
+    /// Completes the oldest pending transfer of the endpoint; false if there is none.
+    bool CompleteNext(std::uint8_t endpoint);
+    /// Cancellations complete later, on the clock's scheduler, instead of inside `Cancel`.
+    void CancelLater(bool later);
+    /// Pending transfers end with `DeviceGone`; nothing is accepted any more.
+    void Unplug();
+    /// What `Claim` answers from now on.
+    void AnswerClaim(Platform::ErrorCode code);
+
+    bool IsClaimed() const;
+    bool IsOpen() const;
+    std::uint32_t TimesOpened() const;
+    std::uint32_t TimesClaimed() const;
+    std::size_t Pending(std::uint8_t endpoint) const;
+
+    std::vector<Platform::Usb::EndpointInfo> Endpoints() override;
+    Platform::ErrorCode Claim() override;
+    void Release() override;
+    Platform::ErrorCode Submit(Platform::Usb::Transfer& transfer) override;
+    void Cancel(Platform::Usb::Transfer& transfer) override;
+    Platform::ErrorCode ClearHalt(std::uint8_t endpoint) override;
+
+    /// A handle to `device` as a bus hands it out: notes when it is opened and closed.
+    static std::shared_ptr<Platform::Usb::UsbDevice> OpenHandle(
+        const std::shared_ptr<ScriptedUsbDevice>& device);
+
+  private:
+    struct Running {
+        std::uint64_t number;
+        Platform::Usb::Transfer* transfer;
+        Exchange row;
+        bool ready;      ///< completes as soon as it is the oldest of its endpoint
+        bool cancelled;  ///< completes out of order
+    };
+
+    bool Matches(const Exchange& row, const Platform::Usb::Transfer& transfer) const;
+    void Mismatch(const std::string& actual);
+    void CompleteReady(std::uint8_t endpoint);
+    void CompleteLater(std::uint64_t number, std::uint64_t delay);
+    static void Finish(const Running& completed);
+
+    mutable std::mutex lock;  // guards all that follows; not held while others are called
+    std::deque<Exchange> script;
+    std::size_t played = 0;
+    bool failed = false;
+    const Pace defaultPace;
+    std::deque<Running> running;  // oldest first
+    std::uint64_t lastNumber = 0;
+    std::vector<std::uint64_t> events;
+    std::set<std::uint8_t> leftToTest;
+    std::deque<std::pair<std::uint8_t, Bytes>> unsent;
+    std::set<std::uint8_t> halted;
+    bool cancelLater = false;
+    bool gone = false;
+    bool claimed = false;
+    std::uint32_t handles = 0;
+    std::uint32_t timesOpened = 0;
+    std::uint32_t timesClaimed = 0;
+    Platform::ErrorCode claimAnswer = Platform::Errors::Success;
+};
+
+/// A bus with such devices, in the order in which they were plugged in.
+class ScriptedBus final : public Platform::Usb::UsbBus {
+  public:
+    void Plug(const std::string& name, std::shared_ptr<ScriptedUsbDevice> device);
+    /// Takes the device off the list and unplugs it.
+    void Unplug(const std::string& name);
+    /// What `Open` answers from now on, unless success.
+    void AnswerOpen(Platform::ErrorCode code);
+
+    std::vector<std::string> List() override;
+    std::shared_ptr<Platform::Usb::UsbDevice> Open(const std::string& name,
+                                                   Platform::ErrorCode& error) override;
+
+  private:
+    std::mutex lock;
+    std::vector<std::pair<std::string, std::shared_ptr<ScriptedUsbDevice>>> devices;
+    Platform::ErrorCode openAnswer = Platform::Errors::Success;
+};
+
+}  // namespace Varnholt::Tests
