@@ -1,0 +1,164 @@
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <memory>
+#include <ostream>
+#include <string>
+
+#include "Platform/DeviceFiles.h"
+#include "Platform/Drivers/DriverFileSystem.h"
+#include "Platform/WaitableObjects.h"
+#include "Protocol/ByteOrder.h"
+#include "Protocol/NativeDriver.h"
+#include "Protocol/UsbIoDriver.h"
+#include "Support/ScriptedUsbDevice.h"
+
+namespace Varnholt::Tests {
+
+/// How a request ended.
+struct Outcome {
+    Platform::ErrorCode code;
+    std::uint32_t bytes;
+    bool operator==(const Outcome&) const = default;
+};
+inline void PrintTo(const Outcome& outcome, std::ostream* out) {
+    *out << "code " << outcome.code << " (0x" << std::hex << outcome.code << std::dec << "), "
+         << outcome.bytes << " bytes";
+}
+
+/// A record with an event of its own. A test closes the file before it lets go of a record that still runs.
+struct Request {
+    Platform::OwnedHandle event{Platform::MakeAutoResetEvent()};
+    Platform::Overlapped record;
+
+    Request() { record.event = event.Get(); }
+    bool TakeSignal() { return Platform::Wait(event.Get(), 0) == Platform::WaitResult::Signalled; }
+};
+
+inline Bytes NativeBlock(std::uint8_t request, std::uint8_t direction, std::uint16_t value = 0,
+                         std::uint16_t index = 0, std::uint8_t type = 2, std::uint8_t recipient = 0) {
+    Bytes block(Protocol::NativeDriver::ControlBlockSize, 0xEE);  // reserved and padding bytes do not matter
+    block[Protocol::NativeDriver::Block::Direction] = direction;
+    block[Protocol::NativeDriver::Block::Type] = type;
+    block[Protocol::NativeDriver::Block::Recipient] = recipient;
+    block[Protocol::NativeDriver::Block::Request] = request;
+    Protocol::StoreLittle16(&block[Protocol::NativeDriver::Block::Value], value);
+    Protocol::StoreLittle16(&block[Protocol::NativeDriver::Block::Index], index);
+    return block;
+}
+
+inline Bytes ConfigurationBlock(std::uint16_t configuration = 0, std::uint16_t entries = 1,
+                                std::uint16_t interface = 0, std::uint16_t alternate = 0,
+                                std::uint32_t maximumTransfer = 65536) {
+    namespace Block = Protocol::UsbIoDriver::ConfigurationBlock;
+    Bytes block(Block::Size);
+    Protocol::StoreLittle16(&block[Block::ConfigurationIndex], configuration);
+    Protocol::StoreLittle16(&block[Block::InterfaceCount], entries);
+    Protocol::StoreLittle16(&block[Block::FirstEntry + Block::EntryInterface], interface);
+    Protocol::StoreLittle16(&block[Block::FirstEntry + Block::EntryAlternateSetting], alternate);
+    Protocol::StoreLittle32(&block[Block::FirstEntry + Block::EntryMaximumTransferSize], maximumTransfer);
+    return block;
+}
+
+inline Bytes RequestBlock(std::uint8_t request, std::uint16_t value = 0, std::uint16_t index = 0,
+                          std::uint32_t type = 2, std::uint32_t recipient = 0, std::uint8_t reserved = 0) {
+    namespace Block = Protocol::UsbIoDriver::RequestBlock;
+    Bytes block(Block::Size);
+    Protocol::StoreLittle32(&block[Block::Type], type);
+    Protocol::StoreLittle32(&block[Block::Recipient], recipient);
+    block[Block::ReservedBits] = reserved;
+    block[Block::Request] = request;
+    Protocol::StoreLittle16(&block[Block::Value], value);
+    Protocol::StoreLittle16(&block[Block::Index], index);
+    return block;
+}
+
+/// Both drivers over one scripted device, "port1".
+class DriverFixture : public testing::Test {
+  protected:
+    DriverFixture() { bus.Plug("port1", device); }
+
+    Platform::Handle Open(const std::string& path) {
+        const Platform::Handle handle = files->Open(path);
+        EXPECT_NE(handle, Platform::InvalidHandle()) << path << ": error " << Platform::LastError();
+        return handle;
+    }
+    Platform::ErrorCode OpenError(const std::string& path) {
+        Platform::SetLastError(0xDEAD);
+        const Platform::Handle handle = files->Open(path);
+        if (handle == Platform::InvalidHandle()) {
+            return Platform::LastError();
+        }
+        files->CloseFile(handle);
+        return Platform::Errors::Success;
+    }
+    Platform::Handle OpenPipe(std::uint32_t number) {
+        return Open("native/port1\\PIPE0" + std::to_string(number));
+    }
+    /// A file of the USBIO driver, configured and bound.
+    Platform::Handle OpenBound(std::uint8_t endpoint) {
+        namespace Code = Protocol::UsbIoDriver::Control;
+        const Platform::Handle handle = Open("usbio/port1");
+        const auto configured = Control(handle, Code::SetConfiguration, ConfigurationBlock()).code;
+        EXPECT_TRUE(configured == 0 || configured == Protocol::UsbIoDriver::Status::AlreadyConfigured);
+        EXPECT_EQ(Control(handle, Code::BindPipe, {endpoint}).code, 0u);
+        return handle;
+    }
+
+    Outcome Control(Platform::Handle file, std::uint32_t code, const Bytes& input = {}) {
+        Bytes output;
+        return Control(file, code, input, output);
+    }
+    Outcome Control(Platform::Handle file, std::uint32_t code, const Bytes& input, Bytes& output) {
+        Request request;
+        return Complete(
+            file, request,
+            files->StartControl(file, code, input.data(), static_cast<std::uint32_t>(input.size()),
+                                output.data(), static_cast<std::uint32_t>(output.size()), request.record));
+    }
+    Outcome Read(Platform::Handle file, Bytes& buffer) {
+        Request request;
+        return Complete(file, request, StartRead(file, buffer, request));
+    }
+    Outcome Write(Platform::Handle file, const Bytes& data) {
+        Request request;
+        return Complete(
+            file, request,
+            files->StartWrite(file, data.data(), static_cast<std::uint32_t>(data.size()), request.record));
+    }
+    bool StartRead(Platform::Handle file, Bytes& buffer, Request& request) {
+        return files->StartRead(file, buffer.data(), static_cast<std::uint32_t>(buffer.size()),
+                                request.record);
+    }
+    /// Starts a read that must stay pending.
+    void StartPending(Platform::Handle file, Bytes& buffer, Request& request) {
+        EXPECT_FALSE(StartRead(file, buffer, request));
+        EXPECT_EQ(Platform::LastError(), Platform::Errors::IoPending);
+    }
+    Outcome Result(Platform::Handle file, Request& request, bool wait = false) {
+        std::uint32_t bytes = 0xDEAD;
+        const bool succeeded = files->GetResult(file, request.record, bytes, wait);
+        return {succeeded ? Platform::Errors::Success : Platform::LastError(), bytes};
+    }
+
+    ScriptedBus bus;
+    std::shared_ptr<ScriptedUsbDevice> device = std::make_shared<ScriptedUsbDevice>();
+    std::unique_ptr<Platform::DeviceFileSystem> files = Platform::Drivers::MakeDriverFileSystem(bus);
+
+  private:
+    Outcome Complete(Platform::Handle file, Request& request, bool atOnce) {
+        if (!atOnce && Platform::LastError() != Platform::Errors::IoPending) {
+            const Platform::ErrorCode code = Platform::LastError();
+            EXPECT_FALSE(request.TakeSignal()) << "signalled without a transfer";
+            EXPECT_EQ(Result(file, request), (Outcome{code, 0})) << "the record does not tell of the failure";
+            return {code, 0};
+        }
+        const Outcome outcome = Result(file, request, true);
+        EXPECT_TRUE(request.TakeSignal()) << "not signalled";
+        return outcome;
+    }
+};
+
+}  // namespace Varnholt::Tests

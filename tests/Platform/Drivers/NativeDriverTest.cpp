@@ -1,0 +1,263 @@
+#include "Platform/Drivers/DriverFixture.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+namespace Errors = Platform::Errors;
+namespace Native = Protocol::NativeDriver;
+using Platform::Usb::TransferStatus;
+
+class NativeDriver : public DriverFixture {};
+
+TEST_F(NativeDriver, OpensWhatItsPathsName) {
+    const struct {
+        const char* path;
+        Platform::ErrorCode error;
+    } cases[] = {
+        {"native/port1", Errors::Success},
+        {"native/port1\\PIPE01", Errors::Success},
+        {"native/port1\\PIPE02", Errors::Success},
+        {"native/port1\\PIPE03", Errors::Success},
+        {"native/port1\\PIPE00", Errors::FileNotFound},
+        {"native/port1\\PIPE04", Errors::FileNotFound},
+        {"native/port1\\PIPE1", Errors::FileNotFound},
+        {"native/port1\\PIPE011", Errors::FileNotFound},
+        {"native/port1\\pipe01", Errors::FileNotFound},
+        {"native/port1\\", Errors::FileNotFound},
+        {"native/PORT1", Errors::FileNotFound},
+        {"native/port2", Errors::FileNotFound},
+        {"native/", Errors::FileNotFound},
+        {"NATIVE/port1", Errors::FileNotFound},
+        {"port1", Errors::FileNotFound},
+        {"", Errors::FileNotFound},
+        {"usbio/port1\\PIPE01", Errors::FileNotFound},
+    };
+    for (const auto& row : cases) {
+        EXPECT_EQ(OpenError(row.path), row.error) << row.path;
+    }
+    EXPECT_FALSE(device->IsOpen());
+}
+
+TEST_F(NativeDriver, ListsTheBus) {
+    bus.Plug("port0", std::make_shared<ScriptedUsbDevice>());
+    EXPECT_EQ(files->ListInterfaces(Native::InterfaceClass),
+              (std::vector<std::string>{"native/port1", "native/port0"}));
+    EXPECT_EQ(files->ListInterfaces(Protocol::UsbIoDriver::InterfaceClass),
+              (std::vector<std::string>{"usbio/port1", "usbio/port0"}));
+    EXPECT_TRUE(files->ListInterfaces(Protocol::Guid{}).empty());
+}
+
+TEST_F(NativeDriver, FilesShareOneClaimedDevice) {
+    const auto main = Open("native/port1");
+    const auto pipe = OpenPipe(1);
+    EXPECT_EQ(device->TimesOpened(), 1u);
+    EXPECT_EQ(device->TimesClaimed(), 1u);
+    EXPECT_TRUE(files->CloseFile(main));
+    EXPECT_TRUE(device->IsClaimed());
+    EXPECT_TRUE(files->CloseFile(pipe));
+    EXPECT_FALSE(device->IsClaimed());
+    EXPECT_FALSE(device->IsOpen());
+}
+
+TEST_F(NativeDriver, OpenPassesOnWhyTheDeviceCannotBeHad) {
+    for (const auto code : {Errors::Busy, Errors::AccessDenied, Errors::DeviceNotConnected}) {
+        device->AnswerClaim(code);
+        EXPECT_EQ(OpenError("native/port1"), code);
+        EXPECT_FALSE(device->IsOpen());
+        device->AnswerClaim(Errors::Success);
+        bus.AnswerOpen(code);
+        EXPECT_EQ(OpenError("native/port1"), code);
+        bus.AnswerOpen(Errors::Success);
+    }
+    EXPECT_EQ(OpenError("native/port1"), Errors::Success);
+}
+
+TEST_F(NativeDriver, CarriesVendorRequests) {
+    device->Expect({
+        VendorOut(0xC0, {}),
+        VendorOut(0xCA, {0x1F}),
+        VendorOut(0xC1, Counting(8), 0x1234, 0xABCD),
+        VendorOut(0xA0, Counting(65535), 0x2000),
+        VendorIn(0xC2, 8, Counting(8, 1)),
+        VendorIn(0xD1, 6, {9, 8}),
+    });
+    const auto file = Open("native/port1");
+    const auto send = [&](const Bytes& block, Bytes data) {
+        return Control(file, Native::ControlVendorRequest, block, data);
+    };
+    EXPECT_EQ(send(NativeBlock(0xC0, 0), {}), (Outcome{0, 0}));
+    EXPECT_EQ(send(NativeBlock(0xCA, 0), {0x1F}), (Outcome{0, 1}));
+    EXPECT_EQ(send(NativeBlock(0xC1, 0, 0x1234, 0xABCD), Counting(8)), (Outcome{0, 8}));
+    EXPECT_EQ(send(NativeBlock(0xA0, 0, 0x2000), Counting(65535)), (Outcome{0, 65535}));
+
+    Bytes answer(8);
+    EXPECT_EQ(Control(file, Native::ControlVendorRequest, NativeBlock(0xC2, 1), answer), (Outcome{0, 8}));
+    EXPECT_EQ(answer, Counting(8, 1));
+    answer.assign(6, 0x55);
+    EXPECT_EQ(Control(file, Native::ControlVendorRequest, NativeBlock(0xD1, 1), answer), (Outcome{0, 2}));
+    EXPECT_EQ(answer, (Bytes{9, 8, 0x55, 0x55, 0x55, 0x55}));
+}
+
+TEST_F(NativeDriver, RefusesWhatAFileDoesNotTake) {
+    const auto refused = [this](Platform::Handle file, std::uint32_t code, const Bytes& input,
+                                std::size_t outputSize = 0) {
+        Bytes output(outputSize);
+        return Control(file, code, input, output).code;
+    };
+    const auto main = Open("native/port1");
+    const auto good = NativeBlock(0xC0, 0);
+    const struct {
+        const char* name;
+        std::uint32_t code;
+        Bytes input;
+        std::size_t outputSize;
+        Platform::ErrorCode error;
+    } controls[] = {
+        {"unknown code", 0x220005, good, 0, Errors::InvalidFunction},
+        {"a USBIO code", Protocol::UsbIoDriver::Control::GetDriverInfo, {}, 12, Errors::InvalidFunction},
+        {"no block", Native::ControlVendorRequest, {}, 0, Errors::InvalidParameter},
+        {"short block", Native::ControlVendorRequest, Bytes(9), 0, Errors::InvalidParameter},
+        {"long block", Native::ControlVendorRequest, Bytes(11), 0, Errors::InvalidParameter},
+        {"direction 2", Native::ControlVendorRequest, NativeBlock(0xC0, 2), 0, Errors::InvalidParameter},
+        {"type 0", Native::ControlVendorRequest, NativeBlock(0xC0, 0, 0, 0, 0), 0, Errors::InvalidParameter},
+        {"recipient 1", Native::ControlVendorRequest, NativeBlock(0xC0, 0, 0, 0, 2, 1), 0,
+         Errors::InvalidParameter},
+        {"data beyond a setup packet's length", Native::ControlVendorRequest, good, 65536,
+         Errors::InvalidParameter},
+        {"abort without a block", Native::ControlAbortPipe, {}, 0, Errors::InvalidParameter},
+        {"abort of an unknown endpoint", Native::ControlAbortPipe, NativeBlock(0, 0, 0x85), 0,
+         Errors::InvalidParameter},
+        {"abort of an endpoint beyond a byte", Native::ControlAbortPipe, NativeBlock(0, 0, 0x184), 0,
+         Errors::InvalidParameter},
+    };
+    for (const auto& row : controls) {
+        EXPECT_EQ(refused(main, row.code, row.input, row.outputSize), row.error) << row.name;
+    }
+    Bytes data(4);
+    for (std::uint32_t pipe = 1; pipe <= 3; ++pipe) {
+        const auto file = OpenPipe(pipe);
+        EXPECT_EQ(refused(file, Native::ControlVendorRequest, good), Errors::InvalidFunction) << pipe;
+        const bool isWritten = pipe == Native::WritePipe;
+        EXPECT_EQ((isWritten ? Read(file, data) : Write(file, data)).code, Errors::InvalidFunction) << pipe;
+    }
+    EXPECT_EQ(Read(main, data).code, Errors::InvalidFunction);
+    EXPECT_EQ(Write(main, data).code, Errors::InvalidFunction);
+}
+
+TEST_F(NativeDriver, PipesAreEndpoints) {
+    device->Expect({
+        BulkIn(256, Counting(256)),
+        BulkOut(Counting(256, 7)),
+        BulkOut({0}),
+        BulkOut({}),
+        BulkIn(512, Counting(100)),
+        BulkIn(8, {0x42}, Protocol::InterruptInEndpoint),
+    });
+    const auto readPipe = OpenPipe(Native::ReadPipe);
+    const auto writePipe = OpenPipe(Native::WritePipe);
+    const auto interruptPipe = OpenPipe(Native::InterruptPipe);
+
+    Bytes buffer(256);
+    EXPECT_EQ(Read(readPipe, buffer), (Outcome{0, 256}));
+    EXPECT_EQ(buffer, Counting(256));
+    EXPECT_EQ(Write(writePipe, Counting(256, 7)), (Outcome{0, 256}));
+    EXPECT_EQ(Write(writePipe, {0}), (Outcome{0, 1}));
+    EXPECT_EQ(Write(writePipe, {}), (Outcome{0, 0})) << "an empty packet";
+    Bytes none;
+    EXPECT_EQ(Read(readPipe, none), (Outcome{0, 0})) << "nothing to ask the device for";
+    buffer.assign(512, 0);
+    EXPECT_EQ(Read(readPipe, buffer), (Outcome{0, 100}));
+    buffer.assign(8, 0);
+    EXPECT_EQ(Read(interruptPipe, buffer), (Outcome{0, 1}));
+    EXPECT_EQ(buffer[0], 0x42);
+}
+
+TEST_F(NativeDriver, AbortEndsTheTransfersOfTheNamedEndpoint) {
+    device->LeaveToTest(Protocol::InterruptInEndpoint);
+    device->LeaveToTest(Protocol::BulkInEndpoint);
+    const auto main = Open("native/port1");
+    const auto readPipe = OpenPipe(Native::ReadPipe);
+    const auto interruptPipe = OpenPipe(Native::InterruptPipe);
+    Bytes read(64), interrupts[2] = {Bytes(8), Bytes(8)};
+    Request reading, listening[2];
+    StartPending(readPipe, read, reading);
+    StartPending(interruptPipe, interrupts[0], listening[0]);
+    StartPending(interruptPipe, interrupts[1], listening[1]);
+
+    Bytes undefined(8, 0x77);
+    EXPECT_EQ(Control(main, Native::ControlAbortPipe, NativeBlock(0, 0, 0x84, 0, 0), undefined),
+              (Outcome{0, 0}));
+    EXPECT_EQ(Result(interruptPipe, listening[0], true), (Outcome{Errors::OperationAborted, 0}));
+    EXPECT_EQ(Result(interruptPipe, listening[1], true), (Outcome{Errors::OperationAborted, 0}));
+    EXPECT_EQ(Result(readPipe, reading), (Outcome{Errors::IoIncomplete, 0}));
+
+    device->Send(Protocol::BulkInEndpoint, {1, 2, 3});
+    EXPECT_EQ(Result(readPipe, reading, true), (Outcome{0, 3}));
+}
+
+TEST_F(NativeDriver, ButtonReportHasNoDataStage) {
+    device->Expect({VendorOut(0xD0, {}, 3)});
+    const auto main = Open("native/port1");
+    Bytes undefined(8, 0x77);
+    EXPECT_EQ(Control(main, Native::ControlButtonReport, NativeBlock(0xD0, 0, 3), undefined),
+              (Outcome{0, 0}));
+}
+
+TEST_F(NativeDriver, HasACodeForEveryOutcome) {
+    const struct {
+        TransferStatus status;
+        Platform::ErrorCode code;
+    } cases[] = {
+        {TransferStatus::Completed, Errors::Success},
+        {TransferStatus::Stalled, Errors::GeneralFailure},
+        {TransferStatus::IoError, Errors::GeneralFailure},
+        {TransferStatus::Overflow, Errors::GeneralFailure},
+        {TransferStatus::Cancelled, Errors::OperationAborted},
+        {TransferStatus::DeviceGone, Errors::DeviceNotConnected},
+    };
+    const auto main = Open("native/port1");
+    const auto readPipe = OpenPipe(Native::ReadPipe);
+    for (const auto& row : cases) {
+        device->Expect(
+            {BulkIn(16, Counting(16)).Ends(row.status, 5), VendorOut(0xC0, {1, 2}).Ends(row.status, 1)});
+        if (row.status == TransferStatus::Stalled) {
+            device->Expect({HaltCleared(Protocol::BulkInEndpoint)});
+        }
+        Bytes buffer(16), data{1, 2};
+        EXPECT_EQ(Read(readPipe, buffer), (Outcome{row.code, 5})) << static_cast<int>(row.status);
+        EXPECT_EQ(buffer[4], 4) << "what has moved counts, whatever the end";
+        EXPECT_EQ(Control(main, Native::ControlVendorRequest, NativeBlock(0xC0, 0), data),
+                  (Outcome{row.code, 1}))
+            << static_cast<int>(row.status);
+    }
+}
+
+TEST_F(NativeDriver, ClearsAHaltBeforeTheNextTransferOnly) {
+    device->Expect({
+        BulkOut({1}),
+        BulkIn(8, {}).Ends(TransferStatus::Stalled),
+        BulkOut({2}),
+        VendorOut(0xC0, {}).Ends(TransferStatus::Stalled),
+        VendorOut(0xC0, {}),
+        HaltCleared(Protocol::BulkInEndpoint).Refused(Errors::GeneralFailure),
+        HaltCleared(Protocol::BulkInEndpoint),
+        BulkIn(8, Counting(8)),
+        BulkIn(8, Counting(8)),
+    });
+    const auto main = Open("native/port1");
+    const auto readPipe = OpenPipe(Native::ReadPipe);
+    const auto writePipe = OpenPipe(Native::WritePipe);
+    const auto vendor = [&] { return Control(main, Native::ControlVendorRequest, NativeBlock(0xC0, 0)); };
+    Bytes buffer(8);
+    EXPECT_EQ(Write(writePipe, {1}), (Outcome{0, 1}));
+    EXPECT_EQ(Read(readPipe, buffer), (Outcome{Errors::GeneralFailure, 0}));
+    EXPECT_EQ(Write(writePipe, {2}), (Outcome{0, 1}));
+    EXPECT_EQ(vendor(), (Outcome{Errors::GeneralFailure, 0}));
+    EXPECT_EQ(vendor(), (Outcome{0, 0}));
+    EXPECT_EQ(Read(readPipe, buffer), (Outcome{Errors::GeneralFailure, 0})) << "still halted";
+    EXPECT_EQ(Read(readPipe, buffer), (Outcome{0, 8}));
+    EXPECT_EQ(Read(readPipe, buffer), (Outcome{0, 8}));
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests

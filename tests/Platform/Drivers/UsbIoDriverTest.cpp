@@ -1,0 +1,304 @@
+#include "Platform/Drivers/DriverFixture.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+namespace Errors = Platform::Errors;
+namespace Code = Protocol::UsbIoDriver::Control;
+namespace Status = Protocol::UsbIoDriver::Status;
+using Platform::Usb::TransferStatus;
+
+constexpr std::uint8_t In = Protocol::BulkInEndpoint;
+constexpr std::uint8_t Out = Protocol::BulkOutEndpoint;
+
+/// A device control on one of several files, and its status.
+struct Step {
+    std::size_t file;
+    std::uint32_t code;
+    Bytes input;
+    std::size_t outputSize;
+    Platform::ErrorCode status;
+};
+
+class UsbIoDriver : public DriverFixture {
+  protected:
+    void Play(const char* name, const std::vector<Step>& steps) {
+        std::vector<Platform::Handle> opened;
+        for (std::size_t i = 0; i < steps.size(); ++i) {
+            const Step& step = steps[i];
+            while (opened.size() <= step.file) {
+                opened.push_back(Open("usbio/port1"));
+            }
+            Bytes output(step.outputSize);
+            EXPECT_EQ(Control(opened[step.file], step.code, step.input, output).code, step.status)
+                << name << ", step " << i << ": code 0x" << std::hex << step.code << " on file " << step.file;
+        }
+        for (const auto handle : opened) {
+            EXPECT_TRUE(files->CloseFile(handle));
+        }
+        EXPECT_FALSE(device->IsOpen()) << name;
+    }
+};
+
+TEST_F(UsbIoDriver, ChecksStatesAsARealDriverDoes) {
+    const Step configure{0, Code::SetConfiguration, ConfigurationBlock(), 0, 0};
+    Play("unconfiguring what is not configured",
+         {{0, Code::UnconfigureDevice, {}, 0, 0}, {0, Code::UnconfigureDevice, {}, 0, 0}});
+    Play("configuring twice",
+         {configure,
+          {0, Code::SetConfiguration, ConfigurationBlock(), 0, Status::AlreadyConfigured},
+          {1, Code::SetConfiguration, ConfigurationBlock(), 0, Status::AlreadyConfigured},
+          {1, Code::UnconfigureDevice, {}, 0, 0},
+          {1, Code::SetConfiguration, ConfigurationBlock(), 0, 0}});
+    Play("binding", {{0, Code::BindPipe, {In}, 0, Status::NotConfigured},
+                     configure,
+                     {0, Code::BindPipe, {0x81}, 0, Status::PipeNotFound},
+                     {0, Code::BindPipe, {0}, 0, Status::PipeNotFound},
+                     {1, Code::BindPipe, {In}, 0, 0},
+                     {1, Code::BindPipe, {In}, 0, Status::AlreadyBound},
+                     {1, Code::BindPipe, {Out}, 0, Status::AlreadyBound},
+                     {2, Code::BindPipe, {In}, 0, Status::AlreadyBound},
+                     {2, Code::BindPipe, {Out}, 0, 0},
+                     {3, Code::BindPipe, {Protocol::InterruptInEndpoint}, 0, 0}});
+    Play("open pipes keep the configuration", {configure,
+                                               {1, Code::BindPipe, {In}, 0, 0},
+                                               {0, Code::UnconfigureDevice, {}, 0, Status::OpenPipes},
+                                               {1, Code::UnconfigureDevice, {}, 0, Status::OpenPipes}});
+    Play("aborting", {{0, Code::AbortPipe, {}, 0, Status::NotBound},
+                      configure,
+                      {0, Code::AbortPipe, {}, 0, Status::NotBound},
+                      {0, Code::BindPipe, {In}, 0, 0},
+                      {0, Code::AbortPipe, {}, 0, 0}});
+    Play("a vendor request before the configuration",
+         {{0, Code::ClassOrVendorOutRequest, RequestBlock(0xC0), 0, Status::NotConfigured},
+          {0, Code::ClassOrVendorInRequest, RequestBlock(0xC0), 0, Status::NotConfigured}});
+}
+
+TEST_F(UsbIoDriver, ChecksSizesAndContents) {
+    Bytes tooShort = ConfigurationBlock();
+    tooShort.pop_back();
+    Play("configuration blocks",
+         {{0, Code::SetConfiguration, {}, 0, Status::InputBufferTooSmall},
+          {0, Code::SetConfiguration, tooShort, 0, Status::InputBufferTooSmall},
+          {0, Code::SetConfiguration, ConfigurationBlock(1), 0, Status::InvalidParameter},
+          {0, Code::SetConfiguration, ConfigurationBlock(0, 0), 0, Status::InvalidParameter},
+          {0, Code::SetConfiguration, ConfigurationBlock(0, 2), 0, Status::InvalidParameter},
+          {0, Code::SetConfiguration, ConfigurationBlock(0, 33), 0, Status::InvalidParameter},
+          {0, Code::SetConfiguration, ConfigurationBlock(0, 1, 0, 0, 0), 0, Status::InvalidParameter},
+          {0, Code::SetConfiguration, ConfigurationBlock(0, 1, 1), 0, Status::InterfaceNotFound},
+          {0, Code::SetConfiguration, ConfigurationBlock(0, 1, 0, 1), 0, Status::InterfaceNotFound}});
+    EXPECT_EQ(device->TimesOpened(), 0u) << "a block that is refused does not reach the device";
+    Play("the other controls",
+         {{0, Code::SetConfiguration, ConfigurationBlock(), 0, 0},
+          {0, Code::BindPipe, {}, 0, Status::InputBufferTooSmall},
+          {0, Code::GetDriverInfo, {}, 11, Status::OutputBufferTooSmall},
+          {0, Code::GetDriverInfo, {}, 0, Status::OutputBufferTooSmall},
+          {0, Code::GetDeviceParameters, {}, 7, Status::OutputBufferTooSmall},
+          {0, Code::SetDeviceParameters, Bytes(7), 0, Status::InputBufferTooSmall},
+          {0, Code::ClassOrVendorOutRequest, Bytes(17), 0, Status::InputBufferTooSmall},
+          {0, Code::ClassOrVendorInRequest, Bytes(17), 0, Status::InputBufferTooSmall},
+          {0, Code::ClassOrVendorOutRequest, RequestBlock(1, 0, 0, 1), 0, Status::InvalidType},
+          {0, Code::ClassOrVendorOutRequest, RequestBlock(1, 0, 0, 2, 1), 0, Status::InvalidRecipient},
+          {0, Code::ClassOrVendorOutRequest, RequestBlock(1, 0, 0, 2, 0, 0x80), 0, Status::InvalidParameter},
+          {0, Code::ClassOrVendorOutRequest, RequestBlock(1, 0, 0, 2, 0, 0x01), 0, Status::InvalidParameter},
+          {0, Code::ClassOrVendorOutRequest, RequestBlock(1), 65536, Status::InvalidParameter},
+          {0, Protocol::NativeDriver::ControlVendorRequest, Bytes(18), 0, Status::ControlNotSupported},
+          {0, 0, {}, 0, Status::ControlNotSupported}});
+}
+
+TEST_F(UsbIoDriver, ListingLeavesTheDeviceAlone) {
+    device->AnswerClaim(Errors::Busy);
+    const auto file = Open("usbio/port1");
+    Bytes info(16, 0x55);
+    EXPECT_EQ(Control(file, Code::GetDriverInfo, {}, info), (Outcome{0, 12}));
+    EXPECT_EQ(info, (Bytes{0x30, 0x02, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0x55, 0x55, 0x55, 0x55}));
+    EXPECT_TRUE(files->CloseFile(file));
+    EXPECT_EQ(device->TimesOpened(), 0u);
+}
+
+TEST_F(UsbIoDriver, ConfiguringTellsWhyTheDeviceCannotBeHad) {
+    const struct {
+        Platform::ErrorCode code;
+        Platform::ErrorCode status;
+    } cases[] = {
+        {Errors::Busy, Status::OpenedByOtherProcess},        {Errors::AccessDenied, Errors::AccessDenied},
+        {Errors::NotEnoughMemory, Status::NoMemory},         {Errors::GeneralFailure, Status::RequestFailed},
+        {Errors::DeviceNotConnected, Status::DeviceRemoved},
+    };
+    for (const auto& row : cases) {
+        const auto file = Open("usbio/port1");
+        bus.AnswerOpen(row.code);
+        EXPECT_EQ(Control(file, Code::SetConfiguration, ConfigurationBlock()).code, row.status) << row.code;
+        EXPECT_TRUE(files->CloseFile(file));
+        bus.AnswerOpen(Errors::Success);
+
+        const auto second = Open("usbio/port1");
+        device->AnswerClaim(row.code);
+        EXPECT_EQ(Control(second, Code::SetConfiguration, ConfigurationBlock()).code, row.status) << row.code;
+        device->AnswerClaim(Errors::Success);
+        EXPECT_EQ(Control(second, Code::UnconfigureDevice).code,
+                  row.status == Status::DeviceRemoved ? Status::DeviceRemoved : Status::Success);
+        EXPECT_TRUE(files->CloseFile(second));
+    }
+}
+
+TEST_F(UsbIoDriver, TheConfigurationLastsAsLongAsAFileIsOpen) {
+    const auto first = Open("usbio/port1");
+    const auto second = Open("usbio/port1");
+    EXPECT_EQ(Control(first, Code::SetConfiguration, ConfigurationBlock()).code, 0u);
+    EXPECT_EQ(Control(first, Code::BindPipe, {In}).code, 0u);
+    EXPECT_TRUE(files->CloseFile(first));
+    EXPECT_TRUE(device->IsClaimed());
+    EXPECT_EQ(Control(second, Code::BindPipe, {In}).code, 0u) << "closing unbinds";
+    EXPECT_TRUE(files->CloseFile(second));
+    EXPECT_FALSE(device->IsClaimed());
+
+    const auto third = Open("usbio/port1");
+    EXPECT_EQ(Control(third, Code::BindPipe, {In}).code, Status::NotConfigured);
+    EXPECT_EQ(Control(third, Code::SetConfiguration, ConfigurationBlock()).code, 0u);
+    EXPECT_EQ(Control(third, Code::UnconfigureDevice).code, 0u);
+    EXPECT_FALSE(device->IsClaimed());
+}
+
+TEST_F(UsbIoDriver, ParametersBelongToTheDevice) {
+    const auto first = Open("usbio/port1");
+    const auto second = Open("usbio/port1");
+    Bytes parameters(8, 0x55);
+    EXPECT_EQ(Control(first, Code::GetDeviceParameters, {}, parameters), (Outcome{0, 8}));
+    EXPECT_EQ(parameters, Bytes(8));
+    EXPECT_EQ(Control(first, Code::SetDeviceParameters, Counting(8, 1)).code, 0u);
+    EXPECT_EQ(Control(second, Code::GetDeviceParameters, {}, parameters), (Outcome{0, 8}));
+    EXPECT_EQ(parameters, Counting(8, 1));
+}
+
+TEST_F(UsbIoDriver, CarriesVendorRequests) {
+    Exchange reserved = VendorOut(0xC7, {5});
+    reserved.setup.requestType |= 0x1C;
+    device->Expect({
+        VendorOut(0xC0, {}),
+        VendorOut(0xC1, Counting(8), 0x1234, 0xABCD),
+        reserved,
+        VendorIn(0xC2, 8, Counting(8, 1)),
+        VendorIn(0xD1, 6, {9, 8}),
+    });
+    const auto file = Open("usbio/port1");
+    EXPECT_EQ(Control(file, Code::SetConfiguration, ConfigurationBlock()).code, 0u);
+    EXPECT_EQ(Control(file, Code::ClassOrVendorOutRequest, RequestBlock(0xC0)), (Outcome{0, 0}));
+    Bytes data = Counting(8);
+    EXPECT_EQ(Control(file, Code::ClassOrVendorOutRequest, RequestBlock(0xC1, 0x1234, 0xABCD), data),
+              (Outcome{0, 8}));
+    data = {5};
+    EXPECT_EQ(Control(file, Code::ClassOrVendorOutRequest, RequestBlock(0xC7, 0, 0, 2, 0, 0x1C), data),
+              (Outcome{0, 1}));
+    data.assign(8, 0);
+    EXPECT_EQ(Control(file, Code::ClassOrVendorInRequest, RequestBlock(0xC2), data), (Outcome{0, 8}));
+    EXPECT_EQ(data, Counting(8, 1));
+    data.assign(6, 0x55);
+    EXPECT_EQ(Control(file, Code::ClassOrVendorInRequest, RequestBlock(0xD1), data), (Outcome{0, 2}));
+    EXPECT_EQ(data, (Bytes{9, 8, 0x55, 0x55, 0x55, 0x55}));
+}
+
+TEST_F(UsbIoDriver, TransfersNeedABoundPipeOfTheirDirection) {
+    device->Expect({BulkIn(65536, Counting(65536)), BulkOut(Counting(3)), BulkIn(1, {0x42}, 0x84)});
+    Bytes buffer(65536), tooLong(65537), one(1), none;
+    const auto unbound = Open("usbio/port1");
+    EXPECT_EQ(Read(unbound, buffer).code, Status::NotBound);
+    EXPECT_EQ(Write(unbound, buffer).code, Status::NotBound);
+    const auto in = OpenBound(In);
+    const auto out = OpenBound(Out);
+    const auto interrupt = OpenBound(Protocol::InterruptInEndpoint);
+    EXPECT_EQ(Read(unbound, buffer).code, Status::NotBound);
+
+    EXPECT_EQ(Write(in, one).code, Status::InvalidDirection);
+    EXPECT_EQ(Write(interrupt, one).code, Status::InvalidDirection);
+    EXPECT_EQ(Read(out, one).code, Status::InvalidDirection);
+    EXPECT_EQ(Read(in, tooLong).code, Status::InvalidParameter);
+    EXPECT_EQ(Write(out, tooLong).code, Status::InvalidParameter);
+
+    EXPECT_EQ(Read(in, buffer), (Outcome{0, 65536}));
+    EXPECT_EQ(buffer, Counting(65536));
+    EXPECT_EQ(Read(in, none), (Outcome{0, 0})) << "nothing to ask the device for";
+    EXPECT_EQ(Write(out, Counting(3)), (Outcome{0, 3}));
+    EXPECT_EQ(Read(interrupt, one), (Outcome{0, 1}));
+    EXPECT_EQ(one[0], 0x42);
+}
+
+TEST_F(UsbIoDriver, TheConfigurationLimitsTransfers) {
+    device->Expect({BulkIn(512, {})});
+    const auto file = Open("usbio/port1");
+    EXPECT_EQ(Control(file, Code::SetConfiguration, ConfigurationBlock(0, 1, 0, 0, 512)).code, 0u);
+    EXPECT_EQ(Control(file, Code::BindPipe, {In}).code, 0u);
+    Bytes fits(512), tooLong(513);
+    EXPECT_EQ(Read(file, fits).code, 0u);
+    EXPECT_EQ(Read(file, tooLong).code, Status::InvalidParameter);
+}
+
+TEST_F(UsbIoDriver, AbortEndsTheTransfersOfThePipe) {
+    device->LeaveToTest(In);
+    device->LeaveToTest(Protocol::InterruptInEndpoint);
+    const auto in = OpenBound(In);
+    const auto interrupt = OpenBound(Protocol::InterruptInEndpoint);
+    Bytes buffers[] = {Bytes(8), Bytes(8), Bytes(1)};
+    Request requests[3];
+    StartPending(in, buffers[0], requests[0]);
+    StartPending(in, buffers[1], requests[1]);
+    StartPending(interrupt, buffers[2], requests[2]);
+    EXPECT_EQ(Control(in, Code::AbortPipe), (Outcome{0, 0}));
+    EXPECT_EQ(Result(in, requests[0], true), (Outcome{Status::Cancelled, 0}));
+    EXPECT_EQ(Result(in, requests[1], true), (Outcome{Status::Cancelled, 0}));
+    EXPECT_EQ(Result(interrupt, requests[2]).code, Errors::IoIncomplete);
+    EXPECT_TRUE(files->CloseFile(interrupt));
+}
+
+TEST_F(UsbIoDriver, HasACodeForEveryOutcome) {
+    const struct {
+        TransferStatus status;
+        Platform::ErrorCode code;
+    } cases[] = {
+        {TransferStatus::Completed, Status::Success},   {TransferStatus::Stalled, Status::EndpointHalted},
+        {TransferStatus::IoError, 0xE0000011},          {TransferStatus::Overflow, Status::BabbleDetected},
+        {TransferStatus::Cancelled, Status::Cancelled}, {TransferStatus::DeviceGone, Status::DeviceRemoved},
+    };
+    const auto in = OpenBound(In);
+    for (const auto& row : cases) {
+        Bytes buffer(16), data{1, 2};
+        device->Expect({BulkIn(16, Counting(16)).Ends(row.status, 5)});
+        EXPECT_EQ(Read(in, buffer), (Outcome{row.code, 5})) << static_cast<int>(row.status);
+        EXPECT_EQ(buffer[4], 4) << "what has moved counts, whatever the end";
+        if (row.status == TransferStatus::Stalled) {
+            device->Expect({HaltCleared(In), BulkIn(16, Counting(16))});
+            EXPECT_EQ(Read(in, buffer), (Outcome{0, 16})) << "the halt is cleared";
+        }
+        if (row.status != TransferStatus::DeviceGone) {
+            device->Expect({VendorOut(0xC0, {1, 2}).Ends(row.status, 1)});
+        }
+        EXPECT_EQ(Control(in, Code::ClassOrVendorOutRequest, RequestBlock(0xC0), data),
+                  (Outcome{row.code, row.status == TransferStatus::DeviceGone ? 0u : 1u}))
+            << static_cast<int>(row.status);
+    }
+}
+
+TEST_F(UsbIoDriver, ADeviceThatIsGoneHasOneCode) {
+    device->LeaveToTest(In);
+    const auto main = Open("usbio/port1");
+    const auto in = OpenBound(In);
+    Bytes buffer(8), info(12), parameters(8);
+    Request reading;
+    StartPending(in, buffer, reading);
+    bus.Unplug("port1");
+    EXPECT_EQ(Result(in, reading, true), (Outcome{Status::DeviceRemoved, 0}));
+    EXPECT_EQ(Read(in, buffer).code, Status::DeviceRemoved);
+    EXPECT_EQ(Control(main, Code::ClassOrVendorOutRequest, RequestBlock(0xC0)).code, Status::DeviceRemoved);
+    EXPECT_EQ(Control(main, Code::UnconfigureDevice).code, Status::DeviceRemoved);
+    EXPECT_EQ(Control(main, Code::SetConfiguration, ConfigurationBlock()).code, Status::DeviceRemoved);
+    EXPECT_EQ(Control(main, Code::BindPipe, {Out}).code, Status::DeviceRemoved);
+    EXPECT_EQ(Control(in, Code::AbortPipe).code, Status::DeviceRemoved);
+    EXPECT_EQ(Control(main, Code::GetDeviceParameters, {}, parameters).code, Status::DeviceRemoved);
+    EXPECT_EQ(Control(main, Code::GetDriverInfo, {}, info).code, 0u);
+    EXPECT_EQ(OpenError("usbio/port1"), Errors::FileNotFound);
+    EXPECT_TRUE(files->CloseFile(in));
+    EXPECT_TRUE(files->CloseFile(main));
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests
