@@ -1,0 +1,45 @@
+#pragma once
+
+#include <atomic>
+#include <utility>
+
+#include "Platform/Usb/UsbDevice.h"
+
+namespace Varnholt::Simulator {
+
+/// Transfers that are done and whose clients are to be told once no lock is held any more. The list runs
+/// through the transfers themselves, so that completing never needs memory.
+class Completions final {
+  public:
+    /// `inProgress` counts the transfers that were added and whose clients have not returned yet.
+    explicit Completions(std::atomic<int>& inProgress) : count(inProgress) {}
+    Completions(const Completions&) = delete;
+    Completions& operator=(const Completions&) = delete;
+
+    void Add(Platform::Usb::Transfer& transfer, Platform::Usb::TransferStatus status,
+             std::uint32_t actualLength) {
+        ++count;
+        transfer.status = status;
+        transfer.actualLength = actualLength;
+        transfer.deviceData = nullptr;
+        (last ? last->deviceData : first) = &transfer;
+        last = &transfer;
+    }
+
+    void Deliver() noexcept {
+        last = nullptr;
+        while (first) {
+            auto& transfer = *static_cast<Platform::Usb::Transfer*>(first);
+            first = std::exchange(transfer.deviceData, nullptr);
+            transfer.client->TransferCompleted(transfer);
+            --count;
+        }
+    }
+
+  private:
+    std::atomic<int>& count;
+    void* first = nullptr;
+    Platform::Usb::Transfer* last = nullptr;
+};
+
+}  // namespace Varnholt::Simulator

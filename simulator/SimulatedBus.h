@@ -1,0 +1,49 @@
+#pragma once
+
+#include <functional>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include "Platform/EventScheduler.h"
+#include "Platform/Usb/UsbDevice.h"
+#include "SimulatedInstrument.h"
+
+namespace Varnholt::Simulator {
+
+/// A bus of simulated instruments in this process. Any thread.
+class SimulatedBus final : public Platform::Usb::UsbBus {
+  public:
+    /// `eventScheduler` must outlive the bus and everything opened from it.
+    explicit SimulatedBus(Platform::EventScheduler& eventScheduler) : scheduler(eventScheduler) {}
+
+    /// The instruments that are plugged in, ordered by name.
+    std::vector<std::string> List() override;
+    std::shared_ptr<Platform::Usb::UsbDevice> Open(const std::string& name,
+                                                   Platform::ErrorCode& error) override;
+
+    /// Puts a new instrument under `name`, plugged in.
+    SimulatedInstrument& Add(const std::string& name, InstrumentSettings settings = {});
+    /// The instrument of that name, plugged in or not; it must have been added.
+    SimulatedInstrument& Instrument(const std::string& name);
+
+    /// What was opened before stays without a device, also after the instrument is back.
+    void Unplug(const std::string& name) { Instrument(name).Unplug(); }
+    void PlugIn(const std::string& name) { Instrument(name).PlugIn(); }
+
+    /// Puts something in front of every device that is opened from now on: a fault injector, a recorder. Null
+    /// takes it away again.
+    using Wrapper = std::function<std::shared_ptr<Platform::Usb::UsbDevice>(
+        const std::string& name, std::shared_ptr<Platform::Usb::UsbDevice> device)>;
+    void WrapDevices(Wrapper devicesWrapper);
+
+  private:
+    Platform::EventScheduler& scheduler;
+    std::mutex mutex;  // guards what follows
+    std::map<std::string, std::shared_ptr<SimulatedInstrument>> instruments;
+    Wrapper wrapper;
+};
+
+}  // namespace Varnholt::Simulator

@@ -1,0 +1,403 @@
+#include "SimulatedInstrument.h"
+
+#include <algorithm>
+#include <new>
+#include <utility>
+
+#include "Completions.h"
+#include "Descriptors.h"
+#include "Platform/Threads.h"
+
+namespace Varnholt::Simulator {
+
+using Platform::ErrorCode;
+using Platform::Usb::Transfer;
+using Platform::Usb::TransferStatus;
+namespace Errors = Platform::Errors;
+
+namespace {
+
+constexpr std::size_t BulkOut = 0;
+constexpr std::size_t BulkIn = 1;
+constexpr std::size_t InterruptIn = 2;
+constexpr std::uint64_t NanosecondsPerSecond = 1'000'000'000;
+constexpr std::uint64_t NanosecondsPerMicrosecond = 1000;
+constexpr std::uint64_t MicrosecondsPerMillisecond = 1000;
+constexpr std::uint8_t ButtonReport = 1;
+
+std::uint64_t InMicroseconds(std::uint64_t nanoseconds) {
+    return (nanoseconds + NanosecondsPerMicrosecond - 1) / NanosecondsPerMicrosecond;
+}
+
+}  // namespace
+
+SimulatedInstrument::SimulatedInstrument(Platform::EventScheduler& eventScheduler,
+                                         InstrumentSettings instrumentSettings)
+    : settings(std::move(instrumentSettings)),
+      scheduler(eventScheduler),
+      timed(settings.bytesPerSecond != 0 || settings.takesIntegrationTime),
+      ownAttachment(),
+      commands(settings),
+      dataAlarm(scheduler, [this] { DataDue(); }),
+      buttonAlarm(scheduler, [this] { PressButton(); }) {}
+
+SimulatedInstrument::~SimulatedInstrument() {
+    Unplug();
+    WaitForClients();
+}
+
+void SimulatedInstrument::WaitForClients() const {
+    // In terms of the platform, whose clock may have to let the other thread run.
+    while (completing != 0) {
+        Platform::SleepMilliseconds(1);
+    }
+}
+
+std::vector<Platform::Usb::EndpointInfo> SimulatedInstrument::Endpoints() {
+    return {Simulator::Endpoints.begin(), Simulator::Endpoints.end()};
+}
+
+SimulatedInstrument::Endpoint* SimulatedInstrument::FindEndpoint(std::uint8_t address) {
+    const auto found =
+        std::ranges::find(Simulator::Endpoints, address, &Platform::Usb::EndpointInfo::address);
+    return found == Simulator::Endpoints.end()
+               ? nullptr
+               : &endpoints[static_cast<std::size_t>(found - Simulator::Endpoints.begin())];
+}
+
+ErrorCode SimulatedInstrument::ClaimFor(const Attachment& attachment) {
+    {
+        const std::lock_guard lock(mutex);
+        if (!Attached(attachment)) {
+            return Errors::DeviceNotConnected;
+        }
+        if (claimedBy) {
+            return Errors::Busy;
+        }
+        claimedBy = &attachment;
+        configuration = ConfigurationValue;
+    }
+    if (settings.buttonAfterMilliseconds) {
+        buttonAlarm.RingNoLaterThan(scheduler.Now() +
+                                    *settings.buttonAfterMilliseconds * MicrosecondsPerMillisecond);
+    }
+    return Errors::Success;
+}
+
+void SimulatedInstrument::ReleaseFor(const Attachment& attachment) {
+    {
+        const std::lock_guard lock(mutex);
+        if (claimedBy != &attachment) {
+            return;
+        }
+        claimedBy = nullptr;
+    }
+    buttonAlarm.Clear();
+}
+
+ErrorCode SimulatedInstrument::SubmitFor(const Attachment& attachment, Transfer& transfer) try {
+    const std::uint64_t now = TimeIfItMatters();
+    Completions done(completing);
+    std::uint64_t ringAt = Never;
+    bool memoryChanged = false;
+    {
+        const std::lock_guard lock(mutex);
+        if (!Attached(attachment)) {
+            return Errors::DeviceNotConnected;
+        }
+        if (transfer.endpoint == 0) {
+            Control(transfer, now, done);
+        } else {
+            Endpoint* const endpoint = FindEndpoint(transfer.endpoint);
+            if (!endpoint) {
+                return Errors::InvalidParameter;
+            }
+            if (endpoint->halted) {
+                done.Add(transfer, TransferStatus::Stalled, 0);
+            } else {
+                endpoint->queue.push_back({&transfer, &attachment, now});
+            }
+        }
+        Serve(now, done);
+        ringAt = nextDataAt;
+        memoryChanged = std::exchange(eepromChanged, false);
+    }
+    if (memoryChanged && settings.memoryChanged) {
+        settings.memoryChanged();
+    }
+    if (ringAt != Never) {
+        dataAlarm.RingNoLaterThan(InMicroseconds(ringAt));
+    }
+    done.Deliver();
+    return Errors::Success;
+} catch (const std::bad_alloc&) {
+    return Errors::NotEnoughMemory;
+}
+
+void SimulatedInstrument::Cancel(Transfer& transfer) {
+    const std::uint64_t now = TimeIfItMatters();
+    Completions done(completing);
+    std::uint64_t ringAt = Never;
+    {
+        const std::lock_guard lock(mutex);
+        for (Endpoint& endpoint : endpoints) {
+            const auto pending = std::ranges::find(endpoint.queue, &transfer, &Pending::transfer);
+            if (pending == endpoint.queue.end()) {
+                continue;
+            }
+            std::uint32_t moved = 0;
+            if (&endpoint == &endpoints[BulkIn] && pending == endpoint.queue.begin()) {
+                moved = TakeWhatMoved(*pending, now);
+            }
+            endpoint.queue.erase(pending);
+            done.Add(transfer, TransferStatus::Cancelled, moved);
+            break;
+        }
+        Serve(now, done);
+        ringAt = nextDataAt;
+    }
+    if (ringAt != Never) {
+        dataAlarm.RingNoLaterThan(InMicroseconds(ringAt));
+    }
+    done.Deliver();
+}
+
+ErrorCode SimulatedInstrument::ClearHaltFor(const Attachment& attachment, std::uint8_t address) {
+    const std::lock_guard lock(mutex);
+    if (!Attached(attachment)) {
+        return Errors::DeviceNotConnected;
+    }
+    Endpoint* const endpoint = FindEndpoint(address);
+    if (!endpoint) {
+        return Errors::InvalidParameter;
+    }
+    endpoint->halted = false;
+    return Errors::Success;
+}
+
+void SimulatedInstrument::Drop(const Attachment& attachment) {
+    ReleaseFor(attachment);
+    Completions done(completing);
+    {
+        const std::lock_guard lock(mutex);
+        for (Endpoint& endpoint : endpoints) {
+            std::erase_if(endpoint.queue, [&](const Pending& pending) {
+                if (pending.owner == &attachment) {
+                    done.Add(*pending.transfer, TransferStatus::Cancelled, 0);
+                }
+                return pending.owner == &attachment;
+            });
+        }
+    }
+    done.Deliver();
+    WaitForClients();
+}
+
+void SimulatedInstrument::Unplug() {
+    buttonAlarm.Clear();
+    Completions done(completing);
+    {
+        const std::lock_guard lock(mutex);
+        pluggedIn = false;
+        claimedBy = nullptr;
+        configuration = 0;
+        buttonReportWaits = false;
+        commands.PowerOff();
+        for (Endpoint& endpoint : endpoints) {
+            endpoint.halted = false;
+            for (const Pending& pending : endpoint.queue) {
+                done.Add(*pending.transfer, TransferStatus::DeviceGone, 0);
+            }
+            endpoint.queue.clear();
+        }
+    }
+    done.Deliver();
+}
+
+void SimulatedInstrument::PlugIn() {
+    const std::lock_guard lock(mutex);
+    if (!pluggedIn) {
+        pluggedIn = true;
+        ++plugging;
+    }
+}
+
+bool SimulatedInstrument::PluggedIn() const {
+    const std::lock_guard lock(mutex);
+    return pluggedIn;
+}
+
+bool SimulatedInstrument::Claimed() const {
+    const std::lock_guard lock(mutex);
+    return claimedBy != nullptr;
+}
+
+std::size_t SimulatedInstrument::PendingTransfers() const {
+    const std::lock_guard lock(mutex);
+    std::size_t count = 0;
+    for (const Endpoint& endpoint : endpoints) {
+        count += endpoint.queue.size();
+    }
+    return count;
+}
+
+void SimulatedInstrument::PressButton() {
+    Completions done(completing);
+    {
+        const std::lock_guard lock(mutex);
+        buttonReportWaits = pluggedIn;
+        ServeInterrupt(done);
+    }
+    done.Deliver();
+}
+
+void SimulatedInstrument::HaltEndpoint(std::uint8_t address) {
+    Completions done(completing);
+    {
+        const std::lock_guard lock(mutex);
+        if (Endpoint* const endpoint = FindEndpoint(address)) {
+            Halt(*endpoint, done);
+        }
+    }
+    done.Deliver();
+}
+
+void SimulatedInstrument::DataDue() {
+    const std::uint64_t now = TimeIfItMatters();
+    Completions done(completing);
+    std::uint64_t ringAt = Never;
+    {
+        const std::lock_guard lock(mutex);
+        Serve(now, done);
+        ringAt = nextDataAt;
+    }
+    if (ringAt != Never) {
+        dataAlarm.RingNoLaterThan(InMicroseconds(ringAt));
+    }
+    done.Deliver();
+}
+
+std::uint64_t SimulatedInstrument::TimeIfItMatters() {
+    return timed ? scheduler.Now() * NanosecondsPerMicrosecond : 0;
+}
+
+void SimulatedInstrument::Halt(Endpoint& endpoint, Completions& done) {
+    endpoint.halted = true;
+    for (const Pending& pending : endpoint.queue) {
+        done.Add(*pending.transfer, TransferStatus::Stalled, 0);
+    }
+    endpoint.queue.clear();
+}
+
+void SimulatedInstrument::Serve(std::uint64_t now, Completions& done) {
+    ServeBulkOut(done);
+    ServeBulkIn(now, done);
+    ServeInterrupt(done);
+}
+
+void SimulatedInstrument::ServeBulkOut(Completions& done) {
+    Endpoint& out = endpoints[BulkOut];
+    while (!out.queue.empty()) {
+        Transfer& transfer = *out.queue.front().transfer;
+        if (transfer.length > 0) {
+            MemoryWrite& write = commands.Write();
+            if (!write.Active()) {
+                return;
+            }
+            switch (write.Take({transfer.data, transfer.length})) {
+                case MemoryWrite::Outcome::Refused:
+                    Halt(out, done);
+                    return;
+                case MemoryWrite::Outcome::Changed:
+                    eepromChanged = true;
+                    break;
+                case MemoryWrite::Outcome::Taken:
+                    break;
+            }
+        }
+        done.Add(transfer, TransferStatus::Completed, transfer.length);
+        out.queue.erase(out.queue.begin());
+    }
+}
+
+std::uint64_t SimulatedInstrument::Duration(std::uint64_t bytes) const {
+    return settings.bytesPerSecond == 0 ? 0 : bytes * NanosecondsPerSecond / settings.bytesPerSecond;
+}
+
+std::uint64_t SimulatedInstrument::Begin(const Pending& pending) const {
+    return std::max({pending.since, answersFrom, lineFreeFrom});
+}
+
+void SimulatedInstrument::ServeBulkIn(std::uint64_t now, Completions& done) {
+    nextDataAt = Never;
+    AnswerStream& answers = commands.Answers();
+    Endpoint& in = endpoints[BulkIn];
+    while (!in.queue.empty()) {
+        const Pending pending = in.queue.front();
+        Transfer& transfer = *pending.transfer;
+        std::uint32_t moved = 0;
+        if (transfer.length > 0) {
+            if (!answers.Active()) {
+                return;
+            }
+            if (timed) {
+                const auto size = std::min<std::uint64_t>(transfer.length, answers.Remaining());
+                const std::uint64_t end = Begin(pending) + Duration(size);
+                if (end > now) {
+                    nextDataAt = end;
+                    return;
+                }
+                lineFreeFrom = end;
+            }
+            moved = answers.Take(transfer.data, transfer.length);
+        }
+        done.Add(transfer, TransferStatus::Completed, moved);
+        in.queue.erase(in.queue.begin());
+    }
+}
+
+std::uint32_t SimulatedInstrument::TakeWhatMoved(const Pending& pending, std::uint64_t now) {
+    AnswerStream& answers = commands.Answers();
+    const std::uint64_t begin = Begin(pending);
+    const auto size = std::min<std::uint64_t>(pending.transfer->length, answers.Remaining());
+    if (settings.bytesPerSecond == 0 || size == 0 || now <= begin) {
+        return 0;
+    }
+    const double seconds = static_cast<double>(now - begin) / static_cast<double>(NanosecondsPerSecond);
+    const double packets = seconds * static_cast<double>(settings.bytesPerSecond) / BulkPacketSize;
+    const std::uint64_t most = (size - 1) / BulkPacketSize;
+    const auto whole = packets < static_cast<double>(most) ? static_cast<std::uint64_t>(packets) : most;
+    if (whole == 0) {
+        return 0;
+    }
+    lineFreeFrom = now;
+    return answers.Take(pending.transfer->data, static_cast<std::uint32_t>(whole * BulkPacketSize));
+}
+
+void SimulatedInstrument::ServeInterrupt(Completions& done) {
+    Endpoint& interrupt = endpoints[InterruptIn];
+    if (!buttonReportWaits || interrupt.queue.empty()) {
+        return;
+    }
+    Transfer& transfer = *interrupt.queue.front().transfer;
+    interrupt.queue.erase(interrupt.queue.begin());
+    if (transfer.length == 0) {
+        done.Add(transfer, TransferStatus::Overflow, 0);
+        return;
+    }
+    buttonReportWaits = false;
+    transfer.data[0] = ButtonReport;
+    done.Add(transfer, TransferStatus::Completed, 1);
+}
+
+std::vector<std::uint8_t> SimulatedInstrument::Eeprom() {
+    return WithCommands([](const Commands& state) { return state.eeprom; });
+}
+
+void SimulatedInstrument::SetEeprom(const std::vector<std::uint8_t>& content) {
+    WithCommands([&](Commands& state) {
+        std::copy_n(content.begin(), std::min(content.size(), state.eeprom.size()), state.eeprom.begin());
+    });
+}
+
+}  // namespace Varnholt::Simulator

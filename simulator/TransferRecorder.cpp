@@ -1,0 +1,154 @@
+#include "TransferRecorder.h"
+
+#include <algorithm>
+#include <map>
+#include <utility>
+
+#include "Platform/Usb/InterceptingDevice.h"
+#include "Protocol/Instrument.h"
+
+namespace Varnholt::Simulator {
+
+using Platform::Usb::InterceptingDevice;
+using Platform::Usb::Transfer;
+using Platform::Usb::TransferStatus;
+using Platform::Usb::UsbDevice;
+
+namespace {
+
+std::string Hexadecimal(std::uint8_t byte) {
+    constexpr const char* digits = "0123456789ABCDEF";
+    return {digits[byte >> 4], digits[byte & 0xF]};
+}
+
+std::string EndpointText(const RecordedTransfer& transfer) {
+    switch (transfer.endpoint) {
+        case 0:
+            return "control " + Hexadecimal(transfer.setup.request) +
+                   (transfer.setup.IsIn() ? " in " : " out ");
+        case Protocol::BulkInEndpoint:
+            return "bulk-in ";
+        case Protocol::BulkOutEndpoint:
+            return "bulk-out ";
+        case Protocol::InterruptInEndpoint:
+            return "interrupt ";
+        default:
+            return "endpoint " + Hexadecimal(transfer.endpoint) + " ";
+    }
+}
+
+}  // namespace
+
+std::string ToText(TransferStatus status) {
+    switch (status) {
+        case TransferStatus::Completed:
+            return "completed";
+        case TransferStatus::Stalled:
+            return "stalled";
+        case TransferStatus::IoError:
+            return "I/O error";
+        case TransferStatus::Overflow:
+            return "overflow";
+        case TransferStatus::Cancelled:
+            return "cancelled";
+        case TransferStatus::DeviceGone:
+            return "device gone";
+    }
+    return "?";
+}
+
+std::string RecordedTransfer::Text(std::size_t most) const {
+    std::string text = EndpointText(*this) + std::to_string(length) + ":";
+    for (std::size_t i = 0; i < std::min(most, data.size()); ++i) {
+        text += " " + Hexadecimal(data[i]);
+    }
+    if (data.size() > most) {
+        text += " ...";
+    }
+    if (!accepted) {
+        return text + " not accepted";
+    }
+    if (!completed) {
+        return text + " pending";
+    }
+    return status == TransferStatus::Completed ? text : text + " " + ToText(status);
+}
+
+class TransferRecorder::Device final : public InterceptingDevice {
+  public:
+    Device(std::shared_ptr<UsbDevice> recorded, TransferRecorder& transferRecorder)
+        : InterceptingDevice(std::move(recorded)), recorder(transferRecorder) {}
+    ~Device() override { Detach(); }
+
+  private:
+    /// Where a running transfer is written down.
+    struct Place {
+        std::size_t cleared;
+        std::size_t index;
+    };
+
+    void BeforeSubmit(std::uint64_t id, Transfer& transfer) override {
+        RecordedTransfer recorded;
+        recorded.endpoint = transfer.endpoint;
+        recorded.setup = transfer.setup;
+        recorded.length = transfer.length;
+        if (!transfer.IsIn()) {
+            recorded.data.assign(transfer.data, transfer.data + transfer.length);
+        }
+        const std::lock_guard lock(recorder.mutex);
+        places[id] = {recorder.cleared, recorder.transfers.size()};
+        recorder.transfers.push_back(std::move(recorded));
+    }
+
+    void AfterCompletion(std::uint64_t id, Transfer& transfer) noexcept override {
+        const std::lock_guard lock(recorder.mutex);
+        if (RecordedTransfer* const recorded = Find(id)) {
+            recorded->completed = true;
+            recorded->status = transfer.status;
+            if (transfer.IsIn()) {
+                recorded->data.assign(transfer.data, transfer.data + transfer.actualLength);
+            } else {
+                recorded->data.resize(std::min<std::size_t>(recorded->data.size(), transfer.actualLength));
+            }
+        }
+        places.erase(id);
+    }
+
+    void Refused(std::uint64_t id, Transfer&, Platform::ErrorCode) override {
+        const std::lock_guard lock(recorder.mutex);
+        if (RecordedTransfer* const recorded = Find(id)) {
+            recorded->accepted = false;
+        }
+        places.erase(id);
+    }
+
+    RecordedTransfer* Find(std::uint64_t id) {
+        const Place place = places.at(id);
+        return place.cleared == recorder.cleared ? &recorder.transfers[place.index] : nullptr;
+    }
+
+    TransferRecorder& recorder;
+    std::map<std::uint64_t, Place> places;  // guarded by the recorder's lock
+};
+
+std::shared_ptr<UsbDevice> TransferRecorder::Record(std::shared_ptr<UsbDevice> device) {
+    return std::make_shared<Device>(std::move(device), *this);
+}
+
+std::vector<RecordedTransfer> TransferRecorder::Transfers() const {
+    const std::lock_guard lock(mutex);
+    return transfers;
+}
+
+std::size_t TransferRecorder::Count() const {
+    const std::lock_guard lock(mutex);
+    return transfers.size();
+}
+
+void TransferRecorder::Clear() {
+    const std::lock_guard lock(mutex);
+    transfers.clear();
+    ++cleared;
+}
+
+}  // namespace Varnholt::Simulator
