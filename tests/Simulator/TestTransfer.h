@@ -4,11 +4,19 @@
 #include <cstdint>
 #include <initializer_list>
 #include <numeric>
+#include <ostream>
 #include <utility>
 #include <vector>
 
 #include "Platform/Usb/UsbDevice.h"
 #include "Protocol/Instrument.h"
+#include "TransferRecorder.h"
+
+namespace Varnholt::Platform::Usb {
+inline void PrintTo(TransferStatus status, std::ostream* stream) {
+    *stream << Simulator::ToText(status);
+}
+}  // namespace Varnholt::Platform::Usb
 
 namespace Varnholt::Simulator {
 
@@ -25,8 +33,8 @@ struct TestTransfer final : Platform::Usb::Transfer, private Platform::Usb::Tran
     }
     static TestTransfer Vendor(Protocol::Request vendorRequest, std::vector<std::uint8_t> bytes = {},
                                std::uint16_t value = 0) {
-        return Control({Protocol::VendorOut, static_cast<std::uint8_t>(vendorRequest), value, 0,
-                        static_cast<std::uint16_t>(bytes.size())},
+        const auto length = static_cast<std::uint16_t>(bytes.size());
+        return Control({Protocol::VendorOut, static_cast<std::uint8_t>(vendorRequest), value, 0, length},
                        std::move(bytes));
     }
     static TestTransfer VendorQuestion(Protocol::Request vendorRequest, std::uint16_t bytes) {
