@@ -25,6 +25,9 @@ class Clock {
   public:
     virtual ~Clock() = default;
 
+    /// Whether threads run one at a time, and hand over in the calls below.
+    virtual bool TakesTurns() const = 0;
+
     /// Any thread, with or without the kernel lock.
     virtual Microseconds Now() = 0;
     virtual WallTime Wall() = 0;

@@ -44,6 +44,7 @@ class ThreadRecord final {
     State state = State::Unknown;
     BlockedCall* call = nullptr;
     Microseconds deadline = Never;
+    bool mustAdvance = false;  ///< nobody can run: this thread is to move the time on
 };
 
 /// The calling thread's record.

@@ -9,6 +9,7 @@ class RealClock final : public Clock {
   public:
     static RealClock& Instance();
 
+    bool TakesTurns() const override { return false; }
     Microseconds Now() override;
     WallTime Wall() override;
     EventScheduler& Scheduler() override;

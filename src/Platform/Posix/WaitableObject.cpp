@@ -93,7 +93,7 @@ WaitAnyResult WaitForAny(KernelHold& hold, std::span<const ObjectRef> objects, M
             clock.Block(hold, waiter, deadline);
         }
         if (waiter.hopeless) {
-            SetLastError(Errors::NotSupported);
+            SetLastError(Errors::OperationAborted);
             return {WaitResult::Failed, 0};
         }
     }

@@ -1,0 +1,250 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <set>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "Platform/EventScheduler.h"
+#include "Platform/Time.h"
+#include "Platform/VirtualClock.h"
+#include "TestThread.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+using testing::ElementsAre;
+using testing::HasSubstr;
+
+TEST(VirtualTime, PassesWhileAllWait) {
+    const auto realStart = std::chrono::steady_clock::now();
+    VirtualClock clock(1);
+    const OwnedHandle event(MakeAutoResetEvent());
+    const std::uint32_t ticks = TickCount();
+    const std::uint64_t counter = PerformanceCounter();
+    const WallTime wall = WallClockNow();
+    EXPECT_EQ(Wait(event.Get(), 5000), WaitResult::TimedOut);
+    SleepMilliseconds(3'600'500);
+    EXPECT_EQ(clock.ElapsedMicroseconds(), 3'605'500'000u);
+    EXPECT_EQ(TickCount() - ticks, 3'605'500u);
+    EXPECT_EQ((PerformanceCounter() - counter) / PerformanceFrequency(), 3605u);
+    EXPECT_EQ(WallClockNow().seconds - wall.seconds, 3605);
+    EXPECT_EQ(WallClockNow().milliseconds, wall.milliseconds + 500);
+    EXPECT_LT(std::chrono::steady_clock::now() - realStart, std::chrono::seconds(5));
+}
+
+TEST(VirtualTime, ManyTimeoutsCostNextToNothing) {
+    VirtualClock clock(1);
+    const OwnedHandle event(MakeAutoResetEvent());
+    const auto realStart = std::chrono::steady_clock::now();
+    for (int i = 0; i < 10'000; ++i) {
+        ASSERT_EQ(Wait(event.Get(), 5000), WaitResult::TimedOut);
+    }
+    EXPECT_EQ(clock.ElapsedMilliseconds(), 50'000'000u);
+    EXPECT_LT(std::chrono::steady_clock::now() - realStart, std::chrono::seconds(5));
+}
+
+TEST(VirtualTime, EventsComeInOrderOfTimeWithoutLocks) {
+    VirtualClock clock(1);
+    EventScheduler& scheduler = ClockScheduler();
+    const std::uint64_t start = scheduler.Now();
+    CriticalSection section;
+    const OwnedHandle done(MakeAutoResetEvent());
+    std::vector<std::string> calls;
+    const auto note = [&](const std::string& text) {
+        const CriticalSection::Holder holder(section);
+        calls.push_back(text + "@" + std::to_string(scheduler.Now() - start));
+    };
+    scheduler.CallAt(start + 300, [&] {
+        note("third");
+        SignalEvent(done.Get());
+    });
+    scheduler.CallAt(start + 100, [&] {
+        note("first");
+        scheduler.CallAt(start + 100, [&] { note("from first"); });
+    });
+    const auto dropped = scheduler.CallAt(start + 150, [&] { note("dropped"); });
+    scheduler.CallAt(start + 200, [&] {
+        note("second");
+        scheduler.Forget(dropped);
+    });
+    scheduler.Forget(dropped);
+    EXPECT_THAT(calls, ElementsAre());
+    EXPECT_EQ(Wait(done.Get(), 5000), WaitResult::Signalled);
+    EXPECT_THAT(calls, ElementsAre("first@100", "from first@100", "second@200", "third@300"));
+}
+
+/// A lock of the thread on whose stack an event is called is not the event's.
+TEST(VirtualTime, EventIsNotTheThreadThatHostsIt) {
+    VirtualClock clock(1);
+    const OwnedHandle mutex(MakeMutex(""));
+    const OwnedHandle over(MakeAutoResetEvent());
+    WaitResult inEvent{};
+    EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
+    ClockScheduler().CallAt(ClockScheduler().Now() + 1000, [&] {
+        inEvent = Wait(mutex.Get(), 5);
+        EXPECT_FALSE(ReleaseMutex(mutex.Get()));
+        SignalEvent(over.Get());
+    });
+    EXPECT_EQ(Wait(over.Get(), 5000), WaitResult::Signalled);
+    EXPECT_EQ(inEvent, WaitResult::TimedOut);
+    EXPECT_EQ(clock.ElapsedMilliseconds(), 6u);
+    EXPECT_TRUE(ReleaseMutex(mutex.Get()));
+}
+
+/// Other threads run on while an event waits, and the time passes.
+TEST(VirtualTime, EventMayWaitForAThread) {
+    VirtualClock clock(1);
+    const OwnedHandle mutex(MakeMutex(""));
+    const OwnedHandle over(MakeAutoResetEvent());
+    TestThread owner([&] {
+        EXPECT_EQ(Wait(mutex.Get(), Infinite), WaitResult::Signalled);
+        SleepMilliseconds(10);
+        ReleaseMutex(mutex.Get());
+    });
+    ClockScheduler().CallAt(ClockScheduler().Now() + 1000, [&] {
+        EXPECT_EQ(Wait(mutex.Get(), Infinite), WaitResult::Signalled);
+        ReleaseMutex(mutex.Get());
+        SignalEvent(over.Get());
+    });
+    EXPECT_EQ(Wait(over.Get(), 5000), WaitResult::Signalled);
+    EXPECT_EQ(clock.ElapsedMilliseconds(), 10u);
+}
+
+/// Three threads note their steps; which steps follow on which is the seed's choice and nobody else's.
+std::string OrderOfSteps(std::uint64_t seed) {
+    VirtualClock clock(seed);
+    CriticalSection section;
+    std::string order;
+    const auto body = [&](char name) {
+        for (int i = 0; i < 6; ++i) {
+            const CriticalSection::Holder holder(section);
+            order += name;
+        }
+        SleepMilliseconds(1);
+        const CriticalSection::Holder holder(section);
+        order += name;
+    };
+    {
+        TestThread first([&] { body('a'); });
+        TestThread second([&] { body('b'); });
+        TestThread third([&] { body('c'); });
+    }
+    return order;
+}
+
+TEST(VirtualTime, SeedDecidesTheOrderOfThreads) {
+    std::set<std::string> orders;
+    for (std::uint64_t seed = 0; seed < 20; ++seed) {
+        const std::string order = OrderOfSteps(seed);
+        EXPECT_EQ(order.size(), 21u);
+        EXPECT_EQ(order, OrderOfSteps(seed)) << "seed " << seed;
+        orders.insert(order);
+    }
+    EXPECT_GT(orders.size(), 15u);
+}
+
+TEST(VirtualTime, SeedDecidesBetweenTimeoutAndEventAtOneTime) {
+    std::set<WaitResult> results;
+    for (std::uint64_t seed = 0; seed < 20; ++seed) {
+        VirtualClock clock(seed);
+        const OwnedHandle event(MakeAutoResetEvent());
+        ClockScheduler().CallAt(ClockScheduler().Now() + 1000, [&] { SignalEvent(event.Get()); });
+        results.insert(Wait(event.Get(), 1));
+        SleepMilliseconds(1);
+    }
+    EXPECT_THAT(results, ElementsAre(WaitResult::Signalled, WaitResult::TimedOut));
+}
+
+TEST(VirtualTime, DeadlockIsReportedAtOnce) {
+    VirtualClock clock(1);
+    std::string report;
+    clock.HandleDeadlock([&](const std::string& text) { report = text; });
+    const OwnedHandle first(MakeMutex(""));
+    const OwnedHandle second(MakeMutex(""));
+    WaitResult ofOther{};
+    EXPECT_EQ(Wait(first.Get(), Infinite), WaitResult::Signalled);
+    TestThread other([&] {
+        Wait(second.Get(), Infinite);
+        ofOther = Wait(first.Get(), Infinite);
+    });
+    SleepMilliseconds(1);
+    EXPECT_EQ(Wait(second.Get(), Infinite), WaitResult::Failed);
+    EXPECT_EQ(clock.ElapsedMilliseconds(), 1u);
+    EXPECT_THAT(report, HasSubstr("(made the clock) waits for a mutex owned by thread "));
+    other.Join();
+    EXPECT_EQ(ofOther, WaitResult::Failed);
+}
+
+TEST(VirtualTimeDeathTest, DeadlockWithoutHandlerAborts) {
+    const auto wait = [] {
+        VirtualClock clock(1);
+        Wait(MakeAutoResetEvent(), Infinite);
+    };
+    EXPECT_DEATH(wait(), "waits for an event");
+}
+
+TEST(VirtualTimeDeathTest, StrangerMayNotWait) {
+    const auto wait = [] {
+        VirtualClock clock(1);
+        std::thread([] { SleepMilliseconds(1); }).join();
+    };
+    EXPECT_DEATH(wait(), "must be started by StartThread");
+}
+
+TEST(VirtualTime, EndWaitsForThreadsAndDropsEvents) {
+    bool ended = false;
+    bool called = false;
+    const auto counted = std::make_shared<int>();
+    {
+        VirtualClock clock(1);
+        EXPECT_TRUE(Close(StartThread(
+            [](void* flag) {
+                SleepMilliseconds(1000);
+                *static_cast<bool*>(flag) = true;
+                return std::uint32_t{0};
+            },
+            &ended)));
+        ClockScheduler().CallAt(ClockScheduler().Now() + 2'000'000, [&called, counted] { called = true; });
+    }
+    EXPECT_TRUE(ended);
+    EXPECT_FALSE(called);
+    EXPECT_EQ(counted.use_count(), 1);
+}
+
+/// Polling with `SleepMilliseconds(0)` must let the time come to what is polled for.
+TEST(VirtualTime, PollingComesToAnEnd) {
+    VirtualClock clock(1);
+    const OwnedHandle event(MakeAutoResetEvent());
+    TestThread other([&] {
+        SleepMilliseconds(2);
+        SignalEvent(event.Get());
+    });
+    while (Wait(event.Get(), 0) != WaitResult::Signalled) {
+        SleepMilliseconds(0);
+    }
+    EXPECT_EQ(clock.ElapsedMilliseconds(), 2u);
+}
+
+TEST(VirtualTime, ForgetWaitsForTheRunningEvent) {
+    for (std::uint64_t seed = 0; seed < 10; ++seed) {
+        VirtualClock clock(seed);
+        const OwnedHandle running(MakeAutoResetEvent());
+        bool over = false;
+        const auto id = ClockScheduler().CallAt(0, [&] {
+            SignalEvent(running.Get());
+            SleepMilliseconds(5);
+            over = true;
+        });
+        TestThread other([&] {
+            EXPECT_EQ(Wait(running.Get(), Infinite), WaitResult::Signalled);
+            ClockScheduler().Forget(id);
+            EXPECT_TRUE(over);
+        });
+    }
+}
+
+}  // namespace
+}  // namespace Varnholt::Platform
