@@ -93,6 +93,7 @@ class InterruptListener::Watch final {
             Listen();
         } catch (...) {  // whatever it was, it ends the thread
         }
+        ClosePipe();
         const ScopedLock held(lock);
         state = State::Ended;
         threadId = {};
@@ -115,7 +116,7 @@ class InterruptListener::Watch final {
     State state = State::Ended;
     bool touched = false;
     std::shared_ptr<EventListener> listener;
-    std::shared_ptr<USBConnection> pipe;  ///< for a `Stop` that has no other means left
+    std::shared_ptr<USBConnection> pipe;  ///< a `Stop` with no other means left closes it
     std::thread::id threadId;
 };
 
@@ -139,8 +140,6 @@ void InterruptListener::Watch::Listen() {
             break;
         }
     }
-    ExchangePipe(nullptr);
-    connection->Close();
 }
 
 void InterruptListener::Watch::DispatchEvent(std::uint32_t count) {

@@ -50,6 +50,8 @@ PellandoFunctionality_PC::PellandoFunctionality_PC(Generic::EventListener* liste
 }
 TRACED
 
+PellandoFunctionality_PC::~PellandoFunctionality_PC() = default;
+
 std::string PellandoFunctionality_PC::GetDeviceAddress(std::uint32_t deviceIndex) try {
     const std::vector<std::string> paths = PellandoUSBDevice::GetAllDevices();
     if (paths.empty()) {

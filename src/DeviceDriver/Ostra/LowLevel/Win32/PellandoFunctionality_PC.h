@@ -23,6 +23,8 @@ class PellandoFunctionality_PC final : public PellandoFunctionalityByte {
   public:
     /// `IOException` "No devices connected" or "No such device connected", or what opening it throws.
     PellandoFunctionality_PC(Generic::EventListener* listener, std::uint32_t deviceIndex);
+    /// Closes the instrument.
+    ~PellandoFunctionality_PC() override;
 
     void RemoveListener(Generic::EventListener* listener) override;
 
