@@ -86,7 +86,7 @@ DeviceList MakeSystemList(const Protocol::Guid& interfaceClass, bool withRegistr
 }  // namespace
 
 bool DeviceInterfaces::Load() {
-    return FilesAreReplaced() ? !CallMustFail("LoadSetupApi") : setupApi.Load() != nullptr;
+    return FilesAreReplaced() ? !CallMustFail("LoadEnumeration") : setupApi.Load() != nullptr;
 }
 
 DeviceList DeviceInterfaces::MakeList(const Protocol::Guid& interfaceClass, bool withRegistryFallback) {
@@ -119,7 +119,7 @@ bool DeviceInterfaces::DestroyList(DeviceList list) {
 
 bool DeviceInterfaces::Find(DeviceList list, const Protocol::Guid& interfaceClass, std::uint32_t index,
                             InterfaceRecord& record) {
-    if (CallMustFail("Find")) {
+    if (CallMustFail("FindInterface")) {
         return false;
     }
     if (list == nullptr) {

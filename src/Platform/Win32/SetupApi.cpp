@@ -9,7 +9,7 @@ SetupApi::~SetupApi() {
 }
 
 const SetupApi::EntryPoints* SetupApi::Load() {
-    if (CallMustFail("LoadSetupApi")) {
+    if (CallMustFail("LoadEnumeration")) {
         return nullptr;
     }
     const std::lock_guard held(lock);

@@ -90,7 +90,7 @@ std::string QualifiedName(const char* signature) {
     return name;
 }
 
-std::string Here(const std::source_location& location) {
+std::string Here(const SourceLocation& location) {
     return FormatLocation("", QualifiedName(location.function_name()).c_str(), location.file_name(),
                           static_cast<int>(location.line()));
 }

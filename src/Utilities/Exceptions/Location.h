@@ -1,7 +1,8 @@
 #pragma once
 
-#include <source_location>
 #include <string>
+
+#include "Utilities/Exceptions/SourceLocation.h"
 
 namespace Varnholt::Utilities::Exceptions {
 
@@ -13,6 +14,6 @@ std::string FormatLocation(const char* context, const char* function, const char
 std::string QualifiedName(const char* signature);
 
 /// The location text of the caller; built only where an exception is about to be thrown.
-std::string Here(const std::source_location& location = std::source_location::current());
+std::string Here(const SourceLocation& location = SourceLocation::current());
 
 }  // namespace Varnholt::Utilities::Exceptions

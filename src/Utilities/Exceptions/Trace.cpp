@@ -31,7 +31,7 @@ void TranslateStdException(const std::exception& exception, const std::string& l
     throw RuntimeException(Tools::ReadableName(typeid(exception)) + " " + exception.what(), location);
 }
 
-void RethrowTraced(const std::source_location& location) {
+void RethrowTraced(const SourceLocation& location) {
     try {
         throw;
     } catch (TraceableException& exception) {

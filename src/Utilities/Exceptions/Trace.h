@@ -1,8 +1,9 @@
 #pragma once
 
 #include <exception>
-#include <source_location>
 #include <string>
+
+#include "Utilities/Exceptions/SourceLocation.h"
 
 namespace Varnholt::Utilities::Exceptions {
 
@@ -13,7 +14,7 @@ namespace Varnholt::Utilities::Exceptions {
 
 /// Called inside a handler: adds `location` to the exception under way if it is one of this hierarchy,
 /// translates it otherwise, and goes on throwing.
-[[noreturn]] void RethrowTraced(const std::source_location& location = std::source_location::current());
+[[noreturn]] void RethrowTraced(const SourceLocation& location = SourceLocation::current());
 
 }  // namespace Varnholt::Utilities::Exceptions
 

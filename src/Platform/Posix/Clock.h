@@ -1,0 +1,66 @@
+#pragma once
+
+#include <cstdint>
+#include <limits>
+#include <mutex>
+
+#include "Platform/EventScheduler.h"
+#include "Platform/Time.h"
+
+namespace Varnholt::Platform::Posix {
+
+class BlockedCall;
+class ThreadRecord;
+
+/// Microseconds of the clock in force; a clock's origin is its own.
+using Microseconds = std::uint64_t;
+inline constexpr Microseconds Never = std::numeric_limits<Microseconds>::max();
+
+/// The kernel lock, held. See Kernel.h.
+using KernelHold = std::unique_lock<std::mutex>;
+
+/// What every blocking call goes through. The operations that take a `KernelHold` are called with the kernel
+/// lock held and return with it held; while they block they let go of it.
+class Clock {
+  public:
+    virtual ~Clock() = default;
+
+    /// Whether threads run one at a time, and hand over in the calls below.
+    virtual bool TakesTurns() const = 0;
+
+    /// Any thread, with or without the kernel lock.
+    virtual Microseconds Now() = 0;
+    virtual WallTime Wall() = 0;
+    virtual EventScheduler& Scheduler() = 0;
+
+    /// Returns once `call` was woken or the time has come, whichever is first.
+    virtual void Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) = 0;
+    /// Lets the blocked call return.
+    virtual void Wake(BlockedCall& call) = 0;
+    /// Makes the caller, whose call another process must end, look again after `period`.
+    virtual void BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
+                                     Microseconds period) = 0;
+
+    /// A platform call begins or has woken somebody: another thread may go first.
+    virtual void Preempt(KernelHold& hold) = 0;
+    /// The caller gives up the rest of its time slice.
+    virtual void GiveUpSlice(KernelHold& hold) = 0;
+
+    /// The life of a thread of `StartThread`. The first is called by its maker and may be undone by the last;
+    /// the others by the thread itself.
+    virtual void ThreadMade(KernelHold& hold, ThreadRecord& thread) = 0;
+    virtual void ThreadBegins(KernelHold& hold, ThreadRecord& thread) = 0;
+    virtual void ThreadEnds(KernelHold& hold, ThreadRecord& thread) = 0;
+    virtual void ThreadNeverBegan(KernelHold& hold, ThreadRecord& thread) = 0;
+};
+
+/// The clock in force.
+Clock& CurrentClock();
+/// Puts another clock in force; null gives the real one back. Only while no other thread is inside a platform
+/// call.
+void InstallClock(Clock* clock);
+
+/// `timeout` milliseconds from now, `Never` for `Infinite`.
+Microseconds DeadlineAfter(std::uint32_t timeout);
+
+}  // namespace Varnholt::Platform::Posix

@@ -1,0 +1,111 @@
+#include <atomic>
+#include <cstdio>
+#include <cstdlib>
+#include <list>
+#include <mutex>
+
+#include "Platform/Posix/Kernel.h"
+#include "Platform/WaitableObjects.h"
+
+namespace Varnholt::Platform {
+
+using namespace Posix;
+
+namespace {
+
+class EnteringSection final : public BlockedCall {
+  public:
+    EnteringSection(ThreadRecord& caller, std::uint32_t ownersNumber)
+        : BlockedCall(caller), owner(ownersNumber) {}
+    std::string Describe() const override {
+        return "a critical section owned by thread " + std::to_string(owner);
+    }
+
+  private:
+    const std::uint32_t owner;
+};
+
+}  // namespace
+
+/// The section's own lock, and not the kernel lock, keeps the threads apart: a tool that looks for data races
+/// then sees exactly the order that the section makes.
+struct CriticalSection::Impl {
+    std::mutex lock;
+    std::atomic<const ThreadRecord*> owner = nullptr;
+    unsigned depth = 0;  // of the owner only
+
+    // Where threads take turns. Guarded by the kernel lock; the first two are the owner's.
+    bool ownerTakesTurns = false;
+    std::uint32_t ownersNumber = 0;
+    std::list<EnteringSection*> entering;
+
+    void EnterInTurn(ThreadRecord& me, Clock& clock);
+    void LeaveInTurn(Clock& clock);
+};
+
+void CriticalSection::Impl::EnterInTurn(ThreadRecord& me, Clock& clock) {
+    KernelHold hold(KernelLock());
+    clock.Preempt(hold);
+    const bool takesTurns = me.state == ThreadRecord::State::Running;
+    while (!lock.try_lock()) {
+        if (!takesTurns || !ownerTakesTurns) {
+            // One of the two is a thread of its own, which goes on while this one waits.
+            hold.unlock();
+            lock.lock();
+            hold.lock();
+            break;
+        }
+        EnteringSection call(me, ownersNumber);
+        entering.push_back(&call);
+        clock.Block(hold, call, Never);
+        entering.remove(&call);
+        if (call.hopeless) {
+            std::fprintf(stderr, "A critical section that is never left cannot be entered.\n");
+            std::abort();
+        }
+    }
+    ownerTakesTurns = takesTurns;
+    ownersNumber = me.number;
+}
+
+void CriticalSection::Impl::LeaveInTurn(Clock& clock) {
+    KernelHold hold(KernelLock());
+    lock.unlock();
+    for (EnteringSection* const call : entering) {
+        clock.Wake(*call);
+    }
+    clock.Preempt(hold);
+}
+
+CriticalSection::CriticalSection() : impl(std::make_unique<Impl>()) {}
+
+CriticalSection::~CriticalSection() = default;
+
+void CriticalSection::Enter() {
+    ThreadRecord& me = CurrentThread();
+    if (impl->owner.load(std::memory_order_relaxed) != &me) {
+        Clock& clock = CurrentClock();
+        if (clock.TakesTurns()) {
+            impl->EnterInTurn(me, clock);
+        } else {
+            impl->lock.lock();
+        }
+        impl->owner.store(&me, std::memory_order_relaxed);
+    }
+    ++impl->depth;
+}
+
+void CriticalSection::Leave() {
+    if (--impl->depth > 0) {
+        return;
+    }
+    impl->owner.store(nullptr, std::memory_order_relaxed);
+    Clock& clock = CurrentClock();
+    if (clock.TakesTurns()) {
+        impl->LeaveInTurn(clock);
+    } else {
+        impl->lock.unlock();
+    }
+}
+
+}  // namespace Varnholt::Platform

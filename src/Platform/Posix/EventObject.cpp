@@ -1,0 +1,17 @@
+#include "Platform/Posix/EventObject.h"
+
+#include <utility>
+
+namespace Varnholt::Platform::Posix {
+
+WaitableObject::Taken EventObject::TryTake(ThreadRecord& /*taker*/) {
+    return std::exchange(signalled, false) ? Taken::Yes : Taken::No;
+}
+
+ErrorCode EventObject::Signal(ThreadRecord& /*signaller*/) {
+    signalled = true;
+    OfferToWaiters();
+    return Errors::Success;
+}
+
+}  // namespace Varnholt::Platform::Posix

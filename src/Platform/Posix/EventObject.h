@@ -1,0 +1,18 @@
+#pragma once
+
+#include "Platform/Posix/WaitableObject.h"
+
+namespace Varnholt::Platform::Posix {
+
+/// An auto-reset event.
+class EventObject final : public WaitableObject {
+  public:
+    Taken TryTake(ThreadRecord& taker) override;
+    ErrorCode Signal(ThreadRecord& signaller) override;
+    std::string Describe() const override { return "an event"; }
+
+  private:
+    bool signalled = false;
+};
+
+}  // namespace Varnholt::Platform::Posix

@@ -1,0 +1,81 @@
+#include "Platform/Posix/HandleTable.h"
+
+#include "Platform/Posix/Immortal.h"
+
+namespace Varnholt::Platform {
+namespace Posix {
+namespace {
+
+/// Handles of waitable objects are 1 modulo 4 (see Handle.h).
+constexpr std::uintptr_t Step = 4;
+constexpr std::uintptr_t FirstValue = 1;
+
+std::uintptr_t Value(Handle handle) {
+    return reinterpret_cast<std::uintptr_t>(handle);
+}
+
+}  // namespace
+
+HandleTable& HandleTable::Instance() {
+    static Immortal<HandleTable> table;
+    return *table;
+}
+
+Handle HandleTable::Add(ObjectRef object) {
+    {
+        const KernelHold hold(KernelLock());
+        ++object->handles;
+    }
+    const std::unique_lock held(lock);
+    do {
+        last = last == 0 ? FirstValue : last + Step;
+    } while (objects.contains(last));
+    objects.emplace(last, std::move(object));
+    return reinterpret_cast<Handle>(last);
+}
+
+ObjectRef HandleTable::Find(Handle handle) {
+    {
+        const std::shared_lock held(lock);
+        const auto found = objects.find(Value(handle));
+        if (found != objects.end()) {
+            return found->second;
+        }
+    }
+    SetLastError(Errors::InvalidHandle);
+    return nullptr;
+}
+
+bool HandleTable::Close(Handle handle) {
+    ObjectRef object;  // dies without a lock held: its end may be a matter of files or threads
+    {
+        const std::unique_lock held(lock);
+        const auto found = objects.find(Value(handle));
+        if (found != objects.end()) {
+            object = std::move(found->second);
+            objects.erase(found);
+        }
+    }
+    if (!object) {
+        SetLastError(Errors::InvalidHandle);
+        return false;
+    }
+    ThreadRecord& me = CurrentThread();
+    const KernelHold hold(KernelLock());
+    if (--object->handles == 0) {
+        object->LastHandleClosed(me);
+    }
+    return true;
+}
+
+}  // namespace Posix
+
+Handle InvalidHandle() {
+    return reinterpret_cast<Handle>(~std::uintptr_t{0});
+}
+
+bool Close(Handle handle) {
+    return Posix::HandleTable::Instance().Close(handle);
+}
+
+}  // namespace Varnholt::Platform

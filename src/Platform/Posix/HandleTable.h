@@ -1,0 +1,37 @@
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <shared_mutex>
+
+#include "Platform/Posix/WaitableObject.h"
+
+namespace Varnholt::Platform::Posix {
+
+/// Says which handle names which waitable object. A value that was never handed out, or whose object was
+/// closed, names nothing; values are not used twice as long as there are others.
+class HandleTable final {
+  public:
+    static HandleTable& Instance();
+
+    Handle Add(ObjectRef object);
+    /// Null, with `Errors::InvalidHandle` in `LastError`, when the handle names nothing.
+    ObjectRef Find(Handle handle);
+    /// As `Find`, for an object of one kind.
+    template <typename Kind>
+    std::shared_ptr<Kind> FindAs(Handle handle) {
+        auto object = std::dynamic_pointer_cast<Kind>(Find(handle));
+        if (!object) {
+            SetLastError(Errors::InvalidHandle);
+        }
+        return object;
+    }
+    bool Close(Handle handle);
+
+  private:
+    std::shared_mutex lock;
+    std::map<std::uintptr_t, ObjectRef> objects;  // guarded by `lock`
+    std::uintptr_t last = 0;                      // guarded by `lock`
+};
+
+}  // namespace Varnholt::Platform::Posix

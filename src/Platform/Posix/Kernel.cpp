@@ -1,0 +1,100 @@
+#include "Platform/Posix/Kernel.h"
+
+#include <pthread.h>
+
+#include <atomic>
+
+#include "Platform/Posix/MutexObject.h"
+#include "Platform/Posix/RealClock.h"
+#include "Platform/WaitableObjects.h"
+
+namespace Varnholt::Platform::Posix {
+namespace {
+
+std::mutex kernelLock;
+std::atomic<Clock*> installedClock = nullptr;
+std::atomic<std::uint32_t> threadCount = 0;
+
+thread_local ThreadRecord* currentThread = nullptr;
+
+void ForgetThread(void* record) {
+    const std::unique_ptr<ThreadRecord> thread(static_cast<ThreadRecord*>(record));
+    // The mutexes are abandoned under the record's own name.
+    ThreadRecord* const before = BindCurrentThread(thread.get());
+    AbandonOwned(*thread);
+    BindCurrentThread(before == thread.get() ? nullptr : before);
+}
+
+/// Notices the end of threads that somebody else started. A `thread_local` with a destructor would keep this
+/// library from being unloaded for as long as a thread lives that once used it.
+class EndOfThreadHook final {
+  public:
+    EndOfThreadHook() : valid(pthread_key_create(&key, ForgetThread) == 0) {}
+    ~EndOfThreadHook() {
+        if (!valid) {
+            return;
+        }
+        if (void* const record = pthread_getspecific(key)) {
+            pthread_setspecific(key, nullptr);
+            ForgetThread(record);
+        }
+        pthread_key_delete(key);
+        valid = false;
+    }
+    EndOfThreadHook(const EndOfThreadHook&) = delete;
+    EndOfThreadHook& operator=(const EndOfThreadHook&) = delete;
+
+    void Watch(ThreadRecord& thread) {
+        if (valid) {
+            pthread_setspecific(key, &thread);
+        }
+    }
+
+  private:
+    pthread_key_t key{};
+    bool valid;
+} endOfThread;
+
+}  // namespace
+
+std::mutex& KernelLock() {
+    return kernelLock;
+}
+
+ThreadRecord::ThreadRecord() : number(++threadCount) {}
+
+ThreadRecord& CurrentThread() {
+    if (!currentThread) {
+        currentThread = std::make_unique<ThreadRecord>().release();
+        endOfThread.Watch(*currentThread);
+    }
+    return *currentThread;
+}
+
+ThreadRecord* BindCurrentThread(ThreadRecord* thread) {
+    return std::exchange(currentThread, thread);
+}
+
+void AbandonOwned(ThreadRecord& thread) {
+    std::vector<std::shared_ptr<MutexObject>> abandoned;  // may die with this, after the lock is gone
+    const KernelHold hold(kernelLock);
+    abandoned.swap(thread.owned);
+    for (const auto& mutex : abandoned) {
+        mutex->Abandon();
+    }
+}
+
+Clock& CurrentClock() {
+    Clock* const clock = installedClock.load(std::memory_order_acquire);
+    return clock ? *clock : RealClock::Instance();
+}
+
+void InstallClock(Clock* clock) {
+    installedClock.store(clock, std::memory_order_release);
+}
+
+Microseconds DeadlineAfter(std::uint32_t timeout) {
+    return timeout == Infinite ? Never : CurrentClock().Now() + Microseconds{timeout} * 1000;
+}
+
+}  // namespace Varnholt::Platform::Posix

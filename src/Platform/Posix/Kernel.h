@@ -1,0 +1,76 @@
+#pragma once
+
+#include <condition_variable>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include "Platform/Posix/Clock.h"
+
+/// The part of the platform that Windows keeps in its kernel: objects that threads wait for.
+///
+/// One lock, the kernel lock, guards every waitable object, every thread record and the virtual clock. It is
+/// held for a few instructions at a time and never while anything outside this folder is called. Nothing else
+/// may be locked while it is held, except the handle table's own lock never: handles are looked up before.
+namespace Varnholt::Platform::Posix {
+
+class MutexObject;
+
+std::mutex& KernelLock();
+
+/// One thread as the platform knows it. Made for a thread at its first platform call, or by `StartThread`.
+class ThreadRecord final {
+  public:
+    ThreadRecord();
+    ThreadRecord(const ThreadRecord&) = delete;
+    ThreadRecord& operator=(const ThreadRecord&) = delete;
+
+    const std::uint32_t number;  ///< for messages
+
+    // All guarded by the kernel lock, except `priority`, which only the thread itself uses.
+    std::condition_variable turn;
+    std::vector<std::shared_ptr<MutexObject>> owned;
+    int priority = 0;
+
+    // For the virtual clock.
+    enum class State {
+        Unknown,  ///< not one of the clock's threads
+        Ready,
+        Running,
+        Blocked,
+        Hosting,  ///< blocked, and its stack is lent to an event
+    };
+    State state = State::Unknown;
+    BlockedCall* call = nullptr;
+    Microseconds deadline = Never;
+    bool mustAdvance = false;  ///< nobody can run: this thread is to move the time on
+};
+
+/// The calling thread's record.
+ThreadRecord& CurrentThread();
+/// Binds `thread` to the calling thread until it ends or null is bound; answers what was bound before.
+ThreadRecord* BindCurrentThread(ThreadRecord* thread);
+
+/// Releases what a thread that ends, or will not be seen again, still owns; its mutexes are abandoned.
+void AbandonOwned(ThreadRecord& thread);
+
+/// A stay inside a call that blocks; lives on the stack of the thread that makes the call.
+class BlockedCall {
+  public:
+    explicit BlockedCall(ThreadRecord& caller) : thread(caller) {}
+    BlockedCall(const BlockedCall&) = delete;
+    BlockedCall& operator=(const BlockedCall&) = delete;
+
+    ThreadRecord& thread;
+    bool woken = false;
+    bool hopeless = false;  ///< the virtual clock found that nothing can ever end the call
+
+    /// For the report of a deadlock: what is waited for.
+    virtual std::string Describe() const = 0;
+
+  protected:
+    ~BlockedCall() = default;
+};
+
+}  // namespace Varnholt::Platform::Posix

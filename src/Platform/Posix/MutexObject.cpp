@@ -1,0 +1,59 @@
+#include "Platform/Posix/MutexObject.h"
+
+#include <algorithm>
+
+namespace Varnholt::Platform::Posix {
+
+WaitableObject::Taken MutexObject::TryTake(ThreadRecord& taker) {
+    if (owner == &taker) {
+        ++depth;
+        return Taken::Yes;
+    }
+    if (owner) {
+        return Taken::No;
+    }
+    const Taken fromOthers = TakeFromOthers();
+    if (fromOthers == Taken::No) {
+        return Taken::No;
+    }
+    taker.owned.push_back(shared_from_this());
+    owner = &taker;
+    depth = 1;
+    const bool wasAbandoned = std::exchange(abandoned, false) || fromOthers == Taken::Abandoned;
+    return wasAbandoned ? Taken::Abandoned : Taken::Yes;
+}
+
+ErrorCode MutexObject::Release(ThreadRecord& releaser) {
+    if (owner != &releaser) {
+        return Errors::NotOwner;
+    }
+    if (--depth > 0) {
+        return Errors::Success;
+    }
+    std::erase_if(releaser.owned, [this](const auto& owned) { return owned.get() == this; });
+    owner = nullptr;
+    GiveToOthers(false);
+    OfferToWaiters();
+    return Errors::Success;
+}
+
+void MutexObject::Abandon() {
+    owner = nullptr;
+    depth = 0;
+    abandoned = true;
+    GiveToOthers(true);
+    OfferToWaiters();
+}
+
+void MutexObject::LastHandleClosed(ThreadRecord& closer) {
+    if (owner == &closer) {
+        std::erase_if(closer.owned, [this](const auto& owned) { return owned.get() == this; });
+        Abandon();
+    }
+}
+
+std::string MutexObject::Describe() const {
+    return owner ? "a mutex owned by thread " + std::to_string(owner->number) : "a mutex";
+}
+
+}  // namespace Varnholt::Platform::Posix

@@ -1,0 +1,35 @@
+#pragma once
+
+#include <string>
+
+#include "Platform/Posix/WaitableObject.h"
+
+namespace Varnholt::Platform::Posix {
+
+/// A recursive mutex owned by a thread. A mutex that is shared with other processes derives from it.
+class MutexObject : public WaitableObject, public std::enable_shared_from_this<MutexObject> {
+  public:
+    Taken TryTake(ThreadRecord& taker) final;
+    ErrorCode Signal(ThreadRecord& signaller) final { return Release(signaller); }
+    void LastHandleClosed(ThreadRecord& closer) final;
+    std::string Describe() const override;
+
+    ErrorCode Release(ThreadRecord& releaser);
+    /// The owner ends without a release: the next to take the mutex is told so. The caller has taken the
+    /// mutex off the owner's list, and runs on the owner's thread.
+    void Abandon();
+
+  protected:
+    bool IsOwnedHere() const { return owner != nullptr; }
+
+  private:
+    /// Between processes: called on the thread that takes or has taken the mutex in this process.
+    virtual Taken TakeFromOthers() { return Taken::Yes; }
+    virtual void GiveToOthers(bool /*wasAbandoned*/) {}
+
+    ThreadRecord* owner = nullptr;
+    unsigned depth = 0;
+    bool abandoned = false;
+};
+
+}  // namespace Varnholt::Platform::Posix

@@ -1,0 +1,62 @@
+#include "Platform/Posix/RealClock.h"
+
+#include <sched.h>
+
+#include <algorithm>
+#include <chrono>
+
+#include "Platform/Posix/Immortal.h"
+#include "Platform/Posix/Kernel.h"
+#include "Platform/Posix/RealScheduler.h"
+
+namespace Varnholt::Platform::Posix {
+
+using std::chrono::steady_clock;
+
+RealClock& RealClock::Instance() {
+    static Immortal<RealClock> clock;
+    return *clock;
+}
+
+Microseconds RealClock::Now() {
+    const auto sinceStart = steady_clock::now().time_since_epoch();
+    return static_cast<Microseconds>(std::chrono::floor<std::chrono::microseconds>(sinceStart).count());
+}
+
+WallTime RealClock::Wall() {
+    const auto now = std::chrono::floor<std::chrono::milliseconds>(std::chrono::system_clock::now());
+    const auto seconds = std::chrono::floor<std::chrono::seconds>(now);
+    return {seconds.time_since_epoch().count(), static_cast<std::uint16_t>((now - seconds).count())};
+}
+
+EventScheduler& RealClock::Scheduler() {
+    return RealScheduler::Instance();
+}
+
+void RealClock::Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) {
+    const auto woken = [&call] { return call.woken; };
+    if (deadline == Never) {
+        call.thread.turn.wait(hold, woken);
+    } else {
+        const steady_clock::time_point end{std::chrono::microseconds(deadline)};
+        call.thread.turn.wait_until(hold, end, woken);
+    }
+}
+
+void RealClock::Wake(BlockedCall& call) {
+    call.woken = true;
+    call.thread.turn.notify_one();
+}
+
+void RealClock::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
+                                    Microseconds period) {
+    Block(hold, call, std::min(deadline, Now() + period));
+}
+
+void RealClock::GiveUpSlice(KernelHold& hold) {
+    hold.unlock();
+    sched_yield();
+    hold.lock();
+}
+
+}  // namespace Varnholt::Platform::Posix

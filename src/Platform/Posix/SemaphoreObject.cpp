@@ -1,0 +1,36 @@
+#include "Platform/Posix/SemaphoreObject.h"
+
+namespace Varnholt::Platform::Posix {
+
+ErrorCode SemaphoreObject::Signal(ThreadRecord& /*signaller*/) {
+    return Release(1);
+}
+
+ErrorCode SemaphoreObject::Release(std::int32_t count) {
+    if (count <= 0) {
+        return Errors::InvalidParameter;
+    }
+    if (!Add(count)) {
+        return Errors::TooManyPosts;
+    }
+    OfferToWaiters();
+    return Errors::Success;
+}
+
+WaitableObject::Taken LocalSemaphore::TryTake(ThreadRecord& /*taker*/) {
+    if (available == 0) {
+        return Taken::No;
+    }
+    --available;
+    return Taken::Yes;
+}
+
+bool LocalSemaphore::Add(std::int32_t count) {
+    if (count > maximum - available) {
+        return false;
+    }
+    available += count;
+    return true;
+}
+
+}  // namespace Varnholt::Platform::Posix

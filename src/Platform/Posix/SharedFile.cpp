@@ -1,0 +1,220 @@
+#include "Platform/Posix/SharedFile.h"
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/mman.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdint>
+#include <cstdio>
+#include <optional>
+#include <string_view>
+#include <utility>
+
+#include "Platform/ErrorCodes.h"
+#include "Platform/Posix/ErrnoCodes.h"
+
+namespace Varnholt::Platform::Posix {
+namespace {
+
+constexpr char Directory[] = "/dev/shm";
+constexpr std::size_t LongestEscapedName = 180;
+constexpr std::size_t KeptOfLongName = 120;
+/// Each attempt but the last met a process that was just letting go of the file, or just making it.
+constexpr int MostAttempts = 1000;
+constexpr useconds_t PauseBetweenAttempts = 200;
+constexpr int AttemptsWithoutPause = 10;
+
+std::string Escaped(const std::string& name) {
+    std::string escaped;
+    for (const char character : name) {
+        const bool usual = (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
+                           (character >= '0' && character <= '9') || character == '_' || character == '-';
+        if (usual) {
+            escaped += character;
+        } else {
+            char code[4];
+            std::snprintf(code, sizeof code, "%%%02X",
+                          static_cast<unsigned>(static_cast<unsigned char>(character)));
+            escaped += code;
+        }
+    }
+    return escaped;
+}
+
+/// FNV-1a; two start values make 128 bits, so that two names do not meet by chance.
+std::string Hash(const std::string& name) {
+    std::string text;
+    for (std::uint64_t hash : {0xCBF29CE484222325u, 0x9AE16A3B2F90404Fu}) {
+        for (const char character : name) {
+            hash = (hash ^ static_cast<unsigned char>(character)) * 0x100000001B3u;
+        }
+        char digits[17];
+        std::snprintf(digits, sizeof digits, "%016llX", static_cast<unsigned long long>(hash));
+        text += digits;
+    }
+    return text;
+}
+
+}  // namespace
+
+/// A file that is open and mapped.
+class SharedFile::OpenFile final {
+  public:
+    explicit OpenFile(int opened) : descriptor(opened) {}
+    ~OpenFile() {
+        Unmap();
+        if (descriptor >= 0) {
+            close(descriptor);
+        }
+    }
+    OpenFile(const OpenFile&) = delete;
+    OpenFile& operator=(const OpenFile&) = delete;
+
+    bool IsOpen() const { return descriptor >= 0; }
+    int Get() const { return descriptor; }
+    void* Memory() const { return memory; }
+
+    bool Map(std::size_t mappedSize) {
+        void* const mapped = mmap(nullptr, mappedSize, PROT_READ | PROT_WRITE, MAP_SHARED, descriptor, 0);
+        if (mapped == MAP_FAILED) {
+            return false;
+        }
+        memory = mapped;
+        size = mappedSize;
+        return true;
+    }
+    void Unmap() {
+        if (memory) {
+            munmap(std::exchange(memory, nullptr), size);
+        }
+    }
+
+  private:
+    const int descriptor;
+    void* memory = nullptr;
+    std::size_t size = 0;
+};
+
+/// The steps of `Open`.
+struct SharedFile::Attempts {
+    using OpenFilePtr = std::unique_ptr<OpenFile>;
+
+    static OpenFilePtr Fail(ErrorCode code) {
+        SetLastError(code);
+        return nullptr;
+    }
+
+    /// Null when the file was in motion: another process made it or let go of it at this moment. Otherwise an
+    /// attempt that came to an end, with a file or, after `LastError` was set, without.
+    using Attempt = std::optional<OpenFilePtr>;
+
+    /// Makes the file without a name, fills it, and then gives it its name if nobody has taken that
+    /// meanwhile.
+    static Attempt Make(const std::string& path, const SharedFile::Content& content) {
+        auto file =
+            std::make_unique<OpenFile>(open(Directory, O_TMPFILE | O_RDWR | O_CLOEXEC, S_IRUSR | S_IWUSR));
+        if (!file->IsOpen() || ftruncate(file->Get(), static_cast<off_t>(content.size)) != 0 ||
+            !file->Map(content.size) || flock(file->Get(), LOCK_SH | LOCK_NB) != 0) {
+            return Fail(CodeOf(errno));
+        }
+        if (!content.initialise(file->Memory(), content.argument)) {
+            return Fail(Errors::NoSystemResources);
+        }
+        const std::string unnamed = "/proc/self/fd/" + std::to_string(file->Get());
+        if (linkat(AT_FDCWD, unnamed.c_str(), AT_FDCWD, path.c_str(), AT_SYMLINK_FOLLOW) != 0) {
+            return errno == EEXIST ? Attempt() : Fail(CodeOf(errno));
+        }
+        return file;
+    }
+
+    /// Opens what another process has made.
+    static Attempt Join(OpenFilePtr file, const std::string& path, const SharedFile::Content& content) {
+        struct stat state {};
+        if (fstat(file->Get(), &state) != 0) {
+            return Fail(CodeOf(errno));
+        }
+        if (!S_ISREG(state.st_mode) || state.st_uid != geteuid()) {
+            return Fail(
+                Errors::AccessDenied);  // also for who could open it: its owner may write anything into it
+        }
+        if (flock(file->Get(), LOCK_SH | LOCK_NB) != 0) {
+            return errno == EWOULDBLOCK ? Attempt() : Fail(CodeOf(errno));
+        }
+        if (fstat(file->Get(), &state) != 0 || state.st_nlink == 0) {
+            return Attempt();
+        }
+        // The size first: memory behind the end of a file must not be touched.
+        if (state.st_size == static_cast<off_t>(content.size)) {
+            if (!file->Map(content.size)) {
+                return Fail(CodeOf(errno));
+            }
+            if (content.isValid(file->Memory())) {
+                return file;
+            }
+        }
+        // Nothing of ours. Without users it only bars the way.
+        if (flock(file->Get(), LOCK_EX | LOCK_NB) == 0 && unlink(path.c_str()) == 0) {
+            return Attempt();
+        }
+        return Fail(Errors::InvalidData);
+    }
+
+    static Attempt OpenOrMake(const std::string& path, const SharedFile::Content& content) {
+        // Not to be kept waiting by a named pipe either, and no link to be followed: the directory is
+        // everybody's.
+        auto file =
+            std::make_unique<OpenFile>(open(path.c_str(), O_RDWR | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+        if (file->IsOpen()) {
+            return Join(std::move(file), path, content);
+        }
+        return errno == ENOENT ? Make(path, content) : Fail(CodeOf(errno));
+    }
+};
+
+SharedFile::SharedFile(std::string openedPath, std::unique_ptr<OpenFile> opened)
+    : path(std::move(openedPath)), file(std::move(opened)) {}
+
+std::unique_ptr<SharedFile> SharedFile::Open(const std::string& kind, const std::string& name,
+                                             const Content& content) {
+    std::string path = PathOf(kind, name);
+    for (int count = 0; count < MostAttempts; ++count) {
+        if (Attempts::Attempt attempt = Attempts::OpenOrMake(path, content)) {
+            return *attempt
+                       ? std::unique_ptr<SharedFile>(new SharedFile(std::move(path), std::move(*attempt)))
+                       : nullptr;
+        }
+        if (count > AttemptsWithoutPause) {
+            usleep(PauseBetweenAttempts);
+        }
+    }
+    SetLastError(Errors::Busy);
+    return nullptr;
+}
+
+SharedFile::~SharedFile() {
+    file->Unmap();
+    if (flock(file->Get(), LOCK_EX | LOCK_NB) != 0) {
+        return;  // others use it
+    }
+    struct stat state {};
+    if (fstat(file->Get(), &state) == 0 && state.st_nlink > 0) {
+        unlink(path.c_str());
+    }
+}
+
+void* SharedFile::Memory() const {
+    return file->Memory();
+}
+
+std::string SharedFile::PathOf(const std::string& kind, const std::string& name) {
+    std::string escaped = Escaped(name);
+    if (escaped.size() > LongestEscapedName) {
+        escaped = escaped.substr(0, KeptOfLongName) + "." + Hash(name);
+    }
+    return std::string(Directory) + "/ostra." + kind + "." + escaped;
+}
+
+}  // namespace Varnholt::Platform::Posix

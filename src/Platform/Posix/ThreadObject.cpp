@@ -1,0 +1,41 @@
+#include "Platform/Posix/ThreadObject.h"
+
+namespace Varnholt::Platform::Posix {
+
+ThreadObject::~ThreadObject() {
+    // The last reference is often the thread's own.
+    if (!joined && pthread_equal(thread, pthread_self())) {
+        pthread_detach(thread);
+    } else {
+        JoinOnce();
+    }
+}
+
+WaitableObject::Taken ThreadObject::TryTake(ThreadRecord& /*taker*/) {
+    return ended ? Taken::Yes : Taken::No;
+}
+
+ErrorCode ThreadObject::Signal(ThreadRecord& /*signaller*/) {
+    return Errors::InvalidHandle;
+}
+
+void ThreadObject::AfterWait() {
+    JoinOnce();
+}
+
+void ThreadObject::JoinOnce() {
+    if (!joined.exchange(true)) {
+        pthread_join(thread, nullptr);
+    }
+}
+
+std::string ThreadObject::Describe() const {
+    return "the end of thread " + std::to_string(number);
+}
+
+void ThreadObject::End() {
+    ended = true;
+    OfferToWaiters();
+}
+
+}  // namespace Varnholt::Platform::Posix

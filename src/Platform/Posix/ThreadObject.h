@@ -1,0 +1,40 @@
+#pragma once
+
+#include <pthread.h>
+
+#include <atomic>
+
+#include "Platform/Posix/WaitableObject.h"
+
+namespace Varnholt::Platform::Posix {
+
+/// A thread of `StartThread`; signalled for good once its entry has returned. The system's thread is joined
+/// by whoever learns of that first, so that none of this library's code runs any more once a wait has said
+/// so.
+class ThreadObject final : public WaitableObject {
+  public:
+    ~ThreadObject() override;
+
+    Taken TryTake(ThreadRecord& taker) override;
+    ErrorCode Signal(ThreadRecord& signaller) override;
+    void AfterWait() override;
+    std::string Describe() const override;
+
+    /// Of the new thread itself, before it ends.
+    void End();
+
+    pthread_t thread{};
+    std::uint32_t number = 0;
+
+  private:
+    void JoinOnce();
+
+    bool ended = false;  // guarded by the kernel lock
+    std::atomic<bool> joined = false;
+
+  public:
+    /// There is no thread to join, because it could not be made.
+    void NeverStarted() { joined = true; }
+};
+
+}  // namespace Varnholt::Platform::Posix

@@ -1,0 +1,129 @@
+#include "Platform/Threads.h"
+
+#include <sys/resource.h>
+#include <unistd.h>
+
+#include "Platform/CallFilter.h"
+#include "Platform/Posix/HandleTable.h"
+#include "Platform/Posix/SystemThread.h"
+#include "Platform/Posix/ThreadObject.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+using namespace Posix;
+
+/// What a new thread is given by its maker.
+struct Start {
+    ThreadEntry entry;
+    void* argument;
+    std::shared_ptr<ThreadObject> object;
+    std::unique_ptr<ThreadRecord> record = std::make_unique<ThreadRecord>();
+};
+
+void* RunThread(void* argument) {
+    const std::unique_ptr<Start> start(static_cast<Start*>(argument));
+    ThreadRecord& record = *start->record;
+    BindCurrentThread(&record);
+    {
+        KernelHold hold(KernelLock());
+        CurrentClock().ThreadBegins(hold, record);
+    }
+    start->entry(start->argument);
+    AbandonOwned(record);
+    {
+        KernelHold hold(KernelLock());
+        start->object->End();
+        CurrentClock().ThreadEnds(hold, record);
+    }
+    BindCurrentThread(nullptr);
+    return nullptr;
+}
+
+class Sleeping final : public BlockedCall {
+  public:
+    using BlockedCall::BlockedCall;
+    std::string Describe() const override { return "the end of a sleep"; }
+};
+
+/// A thread's nice value is its own on Linux.
+constexpr int NicePerLevel = 5;
+
+}  // namespace
+
+Handle StartThread(ThreadEntry entry, void* argument) {
+    if (CallMustFail("StartThread")) {
+        return NoHandle;
+    }
+    auto start = std::make_unique<Start>(Start{entry, argument, std::make_shared<ThreadObject>()});
+    const std::shared_ptr<ThreadObject> object = start->object;
+    ThreadRecord& record = *start->record;
+    object->number = record.number;
+    const Handle handle = HandleTable::Instance().Add(object);
+    {
+        KernelHold hold(KernelLock());
+        CurrentClock().ThreadMade(hold, record);
+    }
+    if (!StartSystemThread(object->thread, RunThread, start.get())) {
+        object->NeverStarted();
+        {
+            KernelHold hold(KernelLock());
+            CurrentClock().ThreadNeverBegan(hold, record);
+        }
+        Close(handle);
+        SetLastError(Errors::NotEnoughMemory);
+        return NoHandle;
+    }
+    static_cast<void>(start.release());  // the thread's now
+    KernelHold hold(KernelLock());
+    CurrentClock().Preempt(hold);
+    return handle;
+}
+
+bool EndThreadByForce(Handle thread, std::uint32_t /*exitCode*/) {
+    if (CallMustFail("EndThreadByForce")) {
+        return false;
+    }
+    if (HandleTable::Instance().FindAs<ThreadObject>(thread)) {
+        SetLastError(Errors::NotSupported);
+    }
+    return false;
+}
+
+int CurrentThreadPriority() {
+    return CurrentThread().priority;
+}
+
+bool SetCurrentThreadPriority(int level) {
+    if (CallMustFail("SetCurrentThreadPriority")) {
+        return false;
+    }
+    if (level < -HighestThreadPriority || level > HighestThreadPriority) {
+        SetLastError(Errors::InvalidParameter);
+        return false;
+    }
+    int& priority = CurrentThread().priority;
+    // A level below normal is only remembered: a thread that has become nicer may not go back without a
+    // privilege. A level that is refused is remembered too, so that callers find what they have set.
+    const int niceBefore = -NicePerLevel * (priority > 0 ? priority : 0);
+    const int niceNow = -NicePerLevel * (level > 0 ? level : 0);
+    if (niceNow != niceBefore) {
+        const auto self = static_cast<id_t>(gettid());
+        const int own = getpriority(PRIO_PROCESS, self);
+        static_cast<void>(setpriority(PRIO_PROCESS, self, own - niceBefore + niceNow));
+    }
+    priority = level;
+    return true;
+}
+
+void SleepMilliseconds(std::uint32_t milliseconds) {
+    KernelHold hold(KernelLock());
+    if (milliseconds == 0) {
+        CurrentClock().GiveUpSlice(hold);
+        return;
+    }
+    Sleeping call(CurrentThread());
+    CurrentClock().Block(hold, call, DeadlineAfter(milliseconds));
+}
+
+}  // namespace Varnholt::Platform

@@ -1,0 +1,27 @@
+#include "Platform/VirtualClock.h"
+
+#include <utility>
+
+#include "Platform/Posix/VirtualTime.h"
+
+namespace Varnholt::Platform {
+
+class VirtualClock::Impl final {
+  public:
+    explicit Impl(std::uint64_t seed) : time(seed) {}
+    Posix::VirtualTime time;
+};
+
+VirtualClock::VirtualClock(std::uint64_t seed) : impl(std::make_unique<Impl>(seed)) {}
+
+VirtualClock::~VirtualClock() = default;
+
+std::uint64_t VirtualClock::ElapsedMicroseconds() const {
+    return impl->time.Elapsed();
+}
+
+void VirtualClock::HandleDeadlock(DeadlockHandler handler) {
+    impl->time.HandleDeadlock(std::move(handler));
+}
+
+}  // namespace Varnholt::Platform

@@ -1,0 +1,345 @@
+#include "Platform/Posix/VirtualTime.h"
+
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+
+#include "Platform/ErrorCodes.h"
+#include "Platform/Posix/RealScheduler.h"
+
+namespace Varnholt::Platform::Posix {
+namespace {
+
+/// 2020-01-01 00:00:00 UTC, so that what depends on the date is repeatable as well.
+constexpr std::int64_t WallStart = 1'577'836'800;
+
+/// One call in so many hands over although the caller could go on.
+constexpr std::uint64_t CallsPerHandOver = 4;
+
+[[noreturn]] void Abort(const std::string& report) {
+    std::fprintf(stderr, "%s\n", report.c_str());
+    std::abort();
+}
+
+class WaitingForThreads final : public BlockedCall {
+  public:
+    using BlockedCall::BlockedCall;
+    std::string Describe() const override { return "the end of the other threads (the clock is to end)"; }
+};
+
+class WaitingForEvent final : public BlockedCall {
+  public:
+    using BlockedCall::BlockedCall;
+    std::string Describe() const override { return "the end of an event that is to be forgotten"; }
+};
+
+class Yielding final : public BlockedCall {
+  public:
+    using BlockedCall::BlockedCall;
+    std::string Describe() const override { return "its next time slice"; }
+};
+
+}  // namespace
+
+VirtualTime::VirtualTime(std::uint64_t seed)
+    : randomState(seed), installer(CurrentThread()), threads{&eventThread, &installer} {
+    const KernelHold hold(KernelLock());
+    installer.state = State::Running;
+    InstallClock(this);
+}
+
+VirtualTime::~VirtualTime() {
+    decltype(events) dropped;
+    KernelHold hold(KernelLock());
+    WaitingForThreads call(installer);
+    awaitingEnd = &call;
+    while (threads.size() > 2 && !call.hopeless) {
+        call.woken = false;
+        Block(hold, call, Never);
+    }
+    if (call.hopeless) {
+        Abort("The virtual clock ends before its threads:\n" + DescribeThreads());
+    }
+    dropped.swap(events);
+    installer.state = State::Unknown;
+    InstallClock(nullptr);
+    hold.unlock();
+}
+
+void VirtualTime::HandleDeadlock(VirtualClock::DeadlockHandler newHandler) {
+    const KernelHold hold(KernelLock());
+    handler = std::move(newHandler);
+}
+
+WallTime VirtualTime::Wall() {
+    const Microseconds elapsed = Elapsed();
+    return {WallStart + static_cast<std::int64_t>(elapsed / 1'000'000),
+            static_cast<std::uint16_t>(elapsed / 1000 % 1000)};
+}
+
+/// SplitMix64: the same numbers for a seed wherever this is built.
+std::uint64_t VirtualTime::Random() {
+    randomState += 0x9E3779B97F4A7C15u;
+    std::uint64_t value = randomState;
+    value = (value ^ (value >> 30)) * 0xBF58476D1CE4E5B9u;
+    value = (value ^ (value >> 27)) * 0x94D049BB133111EBu;
+    return value ^ (value >> 31);
+}
+
+bool VirtualTime::IsDue(const ThreadRecord& thread) const {
+    return thread.call->woken || thread.deadline <= now;
+}
+
+ThreadRecord* VirtualTime::ChooseReady() {
+    const auto isReady = [](const ThreadRecord* thread) { return thread->state == State::Ready; };
+    const auto count = static_cast<std::uint64_t>(std::ranges::count_if(threads, isReady));
+    if (count == 0) {
+        return nullptr;
+    }
+    std::uint64_t skip = count == 1 ? 0 : Random() % count;
+    for (ThreadRecord* const thread : threads) {
+        if (isReady(thread) && skip-- == 0) {
+            return thread;
+        }
+    }
+    return nullptr;
+}
+
+void VirtualTime::Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) {
+    ThreadRecord& self = call.thread;
+    if (self.state != State::Running) {
+        Abort("A thread that the virtual clock does not know wants to wait for " + call.Describe() +
+              ": under this clock, threads that wait must be started by StartThread.");
+    }
+    self.call = &call;
+    self.deadline = deadline;
+    self.state = IsDue(self) ? State::Ready : State::Blocked;
+    HandOver(hold, self);
+    self.call = nullptr;
+    self.deadline = Never;
+}
+
+void VirtualTime::Wake(BlockedCall& call) {
+    call.woken = true;
+    if (call.thread.state == State::Blocked && call.thread.call == &call) {
+        call.thread.state = State::Ready;
+    }
+}
+
+/// The other process lives in real time: as much of it passes as the wait takes of ours.
+void VirtualTime::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
+                                      Microseconds period) {
+    Block(hold, call, std::min(deadline, now + period));
+    if (!call.woken) {
+        hold.unlock();
+        usleep(static_cast<useconds_t>(period));
+        hold.lock();
+    }
+}
+
+/// Called by a thread that gave up being `Running`; returns once it is again.
+void VirtualTime::HandOver(KernelHold& hold, ThreadRecord& self) {
+    while (self.state != State::Running) {
+        ThreadRecord* const next = ChooseReady();
+        if (!next) {
+            Advance(hold, self);
+            continue;
+        }
+        next->state = State::Running;
+        if (next != &self) {
+            next->turn.notify_one();
+            AwaitTurn(hold, self);
+        }
+    }
+}
+
+void VirtualTime::AwaitTurn(KernelHold& hold, ThreadRecord& self) {
+    self.turn.wait(hold, [&self] { return self.state == State::Running || self.mustAdvance; });
+    self.mustAdvance = false;
+}
+
+void VirtualTime::Preempt(KernelHold& hold) {
+    ThreadRecord& self = CurrentThread();
+    if (self.state != State::Running || !std::ranges::any_of(threads, [](const ThreadRecord* thread) {
+            return thread->state == State::Ready;
+        })) {
+        return;
+    }
+    if (Random() % CallsPerHandOver == 0) {
+        self.state = State::Ready;
+        HandOver(hold, self);
+    }
+}
+
+void VirtualTime::GiveUpSlice(KernelHold& hold) {
+    ThreadRecord& self = CurrentThread();
+    if (self.state != State::Running) {
+        return;
+    }
+    ThreadRecord* const next = ChooseReady();
+    if (next) {
+        self.state = State::Ready;
+        next->state = State::Running;
+        next->turn.notify_one();
+        AwaitTurn(hold, self);
+        HandOver(hold, self);
+    } else {
+        Yielding call(self);
+        Block(hold, call, now + 1);
+    }
+}
+
+/// Nobody can run at the present time, which therefore ends.
+void VirtualTime::Advance(KernelHold& hold, ThreadRecord& self) {
+    Microseconds deadline = Never;
+    for (const ThreadRecord* const thread : threads) {
+        if (thread->state == State::Blocked) {
+            deadline = std::min(deadline, thread->deadline);
+        }
+    }
+    const Microseconds eventTime =
+        events.empty() || running != 0 ? Never : std::max(events.begin()->first.first, now.load());
+    const Microseconds next = std::min(deadline, eventTime);
+    if (next == Never) {
+        ReportDeadlock(hold);
+        return;
+    }
+    now = std::max(next, now.load());
+    if (eventTime < deadline || (eventTime == deadline && Random() % 2 == 0)) {
+        CallEvent(hold, self);
+        return;
+    }
+    for (ThreadRecord* const thread : threads) {
+        if (thread->state == State::Blocked && thread->deadline <= now) {
+            thread->state = State::Ready;
+        }
+    }
+}
+
+void VirtualTime::CallEvent(KernelHold& hold, ThreadRecord& host) {
+    const auto first = events.begin();
+    running = first->first.second;
+    std::function<void()> event = std::move(first->second);
+    events.erase(first);
+
+    const ErrorCode errorOfHost = LastError();
+    host.state = State::Hosting;
+    eventThread.state = State::Running;
+    BindCurrentThread(&eventThread);
+    hold.unlock();
+    event();
+    event = nullptr;
+    hold.lock();
+    BindCurrentThread(&host);
+    SetLastError(errorOfHost);
+
+    running = 0;
+    eventThread.state = State::Unknown;
+    host.state = IsDue(host) ? State::Ready : State::Blocked;
+    for (BlockedCall* const call : std::exchange(forgetting, {})) {
+        Wake(*call);
+    }
+    eventEnded.notify_all();
+}
+
+void VirtualTime::ThreadMade(KernelHold& /*hold*/, ThreadRecord& thread) {
+    thread.state = State::Ready;
+    threads.push_back(&thread);
+}
+
+void VirtualTime::ThreadBegins(KernelHold& hold, ThreadRecord& thread) {
+    if (thread.state != State::Unknown) {
+        AwaitTurn(hold, thread);
+    }
+}
+
+void VirtualTime::ThreadNeverBegan(KernelHold& /*hold*/, ThreadRecord& thread) {
+    std::erase(threads, &thread);
+}
+
+void VirtualTime::ThreadEnds(KernelHold& /*hold*/, ThreadRecord& thread) {
+    if (thread.state == State::Unknown) {
+        return;  // of the time before the clock
+    }
+    thread.state = State::Unknown;
+    std::erase(threads, &thread);
+    if (awaitingEnd && threads.size() == 2) {
+        Wake(*awaitingEnd);
+    }
+    if (ThreadRecord* const next = ChooseReady()) {
+        next->state = State::Running;
+        next->turn.notify_one();
+        return;
+    }
+    // Not to be done here: who waits for this thread's end waits for the system's thread as well, and an
+    // event on its stack could need that other thread. Somebody is blocked, at least the installer or the
+    // event that it hosts.
+    const auto blocked = std::ranges::find(threads, State::Blocked, &ThreadRecord::state);
+    (*blocked)->mustAdvance = true;
+    (*blocked)->turn.notify_one();
+}
+
+EventScheduler::EventId VirtualTime::CallAt(std::uint64_t time, std::function<void()> event) {
+    const EventId id = NewEventId();
+    const KernelHold hold(KernelLock());
+    events.emplace(std::pair(time, id), std::move(event));
+    return id;
+}
+
+void VirtualTime::Forget(EventId id) {
+    std::function<void()> dropped;
+    ThreadRecord& self = CurrentThread();
+    KernelHold hold(KernelLock());
+    const auto found =
+        std::ranges::find_if(events, [id](const auto& waiting) { return waiting.first.second == id; });
+    if (found != events.end()) {
+        dropped = std::move(found->second);
+        events.erase(found);
+    } else if (running == id && &self != &eventThread) {
+        if (self.state == State::Running) {
+            WaitingForEvent call(self);
+            forgetting.push_back(&call);
+            Block(hold, call, Never);
+            std::erase(forgetting, &call);
+        } else {
+            eventEnded.wait(hold, [this, id] { return running != id; });
+        }
+    }
+    hold.unlock();
+}
+
+void VirtualTime::ReportDeadlock(KernelHold& hold) {
+    const std::string report = "Deadlock: every thread waits and nothing can wake it.\n" + DescribeThreads();
+    const VirtualClock::DeadlockHandler handle = handler;
+    if (!handle) {
+        Abort(report);
+    }
+    hold.unlock();
+    handle(report);
+    hold.lock();
+    for (ThreadRecord* const thread : threads) {
+        if (thread->state == State::Blocked) {
+            thread->call->hopeless = true;
+            thread->state = State::Ready;
+        }
+    }
+}
+
+std::string VirtualTime::DescribeThreads() const {
+    std::string text;
+    for (const ThreadRecord* const thread : threads) {
+        if (thread->state == State::Unknown) {
+            continue;
+        }
+        text += thread == &eventThread ? "  the event that is running"
+                                       : "  thread " + std::to_string(thread->number);
+        text += thread == &installer ? " (made the clock)" : "";
+        text += thread->call ? " waits for " + thread->call->Describe() : " could run";
+        text += thread->state == State::Hosting ? ", and an event runs on its stack\n" : "\n";
+    }
+    return text;
+}
+
+}  // namespace Varnholt::Platform::Posix

@@ -1,0 +1,80 @@
+#pragma once
+
+#include <atomic>
+#include <condition_variable>
+#include <map>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "Platform/Posix/Clock.h"
+#include "Platform/Posix/Kernel.h"
+#include "Platform/VirtualClock.h"
+
+namespace Varnholt::Platform::Posix {
+
+/// The clock behind `VirtualClock`. Its members are guarded by the kernel lock.
+///
+/// Who may run is passed on like a baton: the record of the thread that has it is in state `Running`, and a
+/// thread whose record is not waits at its own condition variable. Whoever finds that nobody is `Ready` moves
+/// the time on, and calls the event that is due on its own stack, but under a record of the event's own: a
+/// lock that the host of the event holds is not the event's, though both are on one stack.
+class VirtualTime final : public Clock, private EventScheduler {
+  public:
+    explicit VirtualTime(std::uint64_t seed);
+    ~VirtualTime() override;
+    VirtualTime(const VirtualTime&) = delete;
+    VirtualTime& operator=(const VirtualTime&) = delete;
+
+    Microseconds Elapsed() const { return now - Start; }
+    void HandleDeadlock(VirtualClock::DeadlockHandler handler);
+
+    bool TakesTurns() const override { return true; }
+    Microseconds Now() override { return now; }
+    WallTime Wall() override;
+    EventScheduler& Scheduler() override { return *this; }
+
+    void Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) override;
+    void Wake(BlockedCall& call) override;
+    void BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
+                             Microseconds period) override;
+    void Preempt(KernelHold& hold) override;
+    void GiveUpSlice(KernelHold& hold) override;
+    void ThreadMade(KernelHold& hold, ThreadRecord& thread) override;
+    void ThreadBegins(KernelHold& hold, ThreadRecord& thread) override;
+    void ThreadEnds(KernelHold& hold, ThreadRecord& thread) override;
+    void ThreadNeverBegan(KernelHold& hold, ThreadRecord& thread) override;
+
+  private:
+    using State = ThreadRecord::State;
+
+    EventId CallAt(std::uint64_t time, std::function<void()> event) override;
+    void Forget(EventId id) override;
+
+    bool IsDue(const ThreadRecord& thread) const;
+    ThreadRecord* ChooseReady();
+    std::uint64_t Random();
+    void HandOver(KernelHold& hold, ThreadRecord& self);
+    void AwaitTurn(KernelHold& hold, ThreadRecord& self);
+    void Advance(KernelHold& hold, ThreadRecord& self);
+    void CallEvent(KernelHold& hold, ThreadRecord& host);
+    void ReportDeadlock(KernelHold& hold);
+    std::string DescribeThreads() const;
+
+    /// Not 0, which could be taken for no time at all.
+    static constexpr Microseconds Start = 1'000'000;
+
+    std::atomic<Microseconds> now = Start;
+    std::uint64_t randomState;
+    ThreadRecord& installer;
+    ThreadRecord eventThread;
+    std::vector<ThreadRecord*> threads;  ///< in the order in which they were made
+    std::map<std::pair<Microseconds, EventId>, std::function<void()>> events;
+    EventId running = 0;
+    std::condition_variable eventEnded;     ///< for threads that do not take turns
+    std::vector<BlockedCall*> forgetting;   ///< wait for the running event's end
+    BlockedCall* awaitingEnd = nullptr;     ///< of the clock's own end
+    VirtualClock::DeadlockHandler handler;  ///< may be empty
+};
+
+}  // namespace Varnholt::Platform::Posix

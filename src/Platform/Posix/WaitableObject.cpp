@@ -1,0 +1,103 @@
+#include "Platform/Posix/WaitableObject.h"
+
+#include <algorithm>
+
+namespace Varnholt::Platform::Posix {
+namespace {
+
+/// How often a thread looks for what another process may have released.
+constexpr Microseconds FirstLook = 500;
+constexpr Microseconds LongestLook = 4000;
+
+}  // namespace
+
+/// One wait, entered with each of its objects.
+class Waiter final : public BlockedCall {
+  public:
+    Waiter(ThreadRecord& caller, std::span<const ObjectRef> waitedFor)
+        : BlockedCall(caller), objects(waitedFor) {
+        for (const auto& object : objects) {
+            object->waiters.push_back(this);
+        }
+    }
+    ~Waiter() {
+        for (const auto& object : objects) {
+            object->waiters.remove(this);
+        }
+    }
+
+    bool Take() {
+        const auto untilTaken = [this](const ObjectRef& object) { return Offer(*object); };
+        return std::ranges::any_of(objects, untilTaken);
+    }
+
+    /// True when the object was taken.
+    bool Offer(WaitableObject& object) {
+        const WaitableObject::Taken taken = object.TryTake(thread);
+        if (taken == WaitableObject::Taken::No) {
+            return false;
+        }
+        const auto found = std::ranges::find_if(
+            objects, [&](const ObjectRef& waitedFor) { return waitedFor.get() == &object; });
+        outcome.index = static_cast<std::size_t>(found - objects.begin());
+        outcome.result =
+            taken == WaitableObject::Taken::Abandoned ? WaitResult::Abandoned : WaitResult::Signalled;
+        return true;
+    }
+
+    bool IsSatisfied() const { return outcome.result != WaitResult::TimedOut; }
+    const WaitAnyResult& Outcome() const { return outcome; }
+
+    bool NeedsOtherProcess() const {
+        return std::ranges::any_of(objects,
+                                   [](const ObjectRef& object) { return object->IsHeldElsewhere(); });
+    }
+
+    std::string Describe() const override {
+        std::string text;
+        for (const auto& object : objects) {
+            text += (text.empty() ? "" : " or ") + object->Describe();
+        }
+        return text;
+    }
+
+  private:
+    const std::span<const ObjectRef> objects;
+    WaitAnyResult outcome{WaitResult::TimedOut, 0};
+};
+
+void WaitableObject::OfferToWaiters() {
+    for (Waiter* const waiter : waiters) {
+        if (waiter->IsSatisfied()) {
+            continue;
+        }
+        if (!waiter->Offer(*this)) {
+            return;
+        }
+        CurrentClock().Wake(*waiter);
+    }
+}
+
+WaitAnyResult WaitForAny(KernelHold& hold, std::span<const ObjectRef> objects, Microseconds deadline) {
+    Waiter waiter(CurrentThread(), objects);
+    Clock& clock = CurrentClock();
+    Microseconds period = FirstLook;
+    while (!waiter.IsSatisfied() && !waiter.Take()) {
+        if (clock.Now() >= deadline) {
+            break;
+        }
+        if (waiter.NeedsOtherProcess()) {
+            clock.BlockOnOtherProcess(hold, waiter, deadline, period);
+            period = std::min(2 * period, LongestLook);
+        } else {
+            clock.Block(hold, waiter, deadline);
+        }
+        if (waiter.hopeless) {
+            SetLastError(Errors::OperationAborted);
+            return {WaitResult::Failed, 0};
+        }
+    }
+    return waiter.Outcome();
+}
+
+}  // namespace Varnholt::Platform::Posix

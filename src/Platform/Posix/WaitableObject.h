@@ -1,0 +1,58 @@
+#pragma once
+
+#include <cstddef>
+#include <list>
+#include <memory>
+#include <span>
+#include <string>
+
+#include "Platform/ErrorCodes.h"
+#include "Platform/Posix/Kernel.h"
+#include "Platform/WaitableObjects.h"
+
+namespace Varnholt::Platform::Posix {
+
+class Waiter;
+
+/// Something a thread can wait for. All operations with the kernel lock held unless they say otherwise.
+///
+/// What an object has to give is handed to the threads that wait for it, first come first served, by the
+/// thread that makes it available: two signals in a row end two waits, however late the waiting threads run.
+class WaitableObject {
+  public:
+    enum class Taken { No, Yes, Abandoned };
+
+    WaitableObject() = default;
+    virtual ~WaitableObject() = default;
+    WaitableObject(const WaitableObject&) = delete;
+    WaitableObject& operator=(const WaitableObject&) = delete;
+
+    /// Takes for `taker` what a wait takes, if it is there.
+    virtual Taken TryTake(ThreadRecord& taker) = 0;
+    /// Signals or releases the object by one, for `SignalAndWait`.
+    virtual ErrorCode Signal(ThreadRecord& signaller) = 0;
+    /// True when another process may have to make the object available.
+    virtual bool IsHeldElsewhere() const { return false; }
+    /// After a wait of the caller has taken the object, without the kernel lock.
+    virtual void AfterWait() {}
+    /// The last handle is closed by `closer`.
+    virtual void LastHandleClosed(ThreadRecord& /*closer*/) {}
+    virtual std::string Describe() const = 0;
+
+  protected:
+    void OfferToWaiters();
+
+  private:
+    friend class Waiter;
+    std::list<Waiter*> waiters;
+    friend class HandleTable;
+    std::size_t handles = 0;
+};
+
+using ObjectRef = std::shared_ptr<WaitableObject>;
+
+/// Waits until one of `objects` could be taken for the calling thread. With the kernel lock held; lets go of
+/// it while blocked.
+WaitAnyResult WaitForAny(KernelHold& hold, std::span<const ObjectRef> objects, Microseconds deadline);
+
+}  // namespace Varnholt::Platform::Posix

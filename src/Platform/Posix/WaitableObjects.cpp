@@ -1,0 +1,155 @@
+#include "Platform/WaitableObjects.h"
+
+#include <algorithm>
+#include <array>
+#include <vector>
+
+#include "Platform/CallFilter.h"
+#include "Platform/Posix/EventObject.h"
+#include "Platform/Posix/HandleTable.h"
+#include "Platform/Posix/MutexObject.h"
+#include "Platform/Posix/SemaphoreObject.h"
+#include "Platform/Posix/SharedObjects.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+using namespace Posix;
+
+/// The limit that Windows sets.
+constexpr std::size_t MostObjectsPerWait = 64;
+
+bool Succeeded(ErrorCode code) {
+    if (code != Errors::Success) {
+        SetLastError(code);
+    }
+    return code == Errors::Success;
+}
+
+Handle AddIfMade(ObjectRef object) {
+    return object ? HandleTable::Instance().Add(std::move(object)) : NoHandle;
+}
+
+/// Runs `action` on the object with the kernel lock held, where another thread may go first and last.
+template <typename Kind, typename Action>
+bool OnObject(Handle handle, Action action) {
+    const auto object = HandleTable::Instance().FindAs<Kind>(handle);
+    if (!object) {
+        return false;
+    }
+    KernelHold hold(KernelLock());
+    CurrentClock().Preempt(hold);
+    const ErrorCode code = action(*object);
+    CurrentClock().Preempt(hold);
+    return Succeeded(code);
+}
+
+WaitAnyResult WaitForObjects(std::span<const ObjectRef> objects, std::uint32_t timeout) {
+    const Microseconds deadline = DeadlineAfter(timeout);
+    WaitAnyResult outcome{};
+    {
+        KernelHold hold(KernelLock());
+        CurrentClock().Preempt(hold);
+        outcome = WaitForAny(hold, objects, deadline);
+    }
+    if (outcome.result == WaitResult::Signalled) {
+        objects[outcome.index]->AfterWait();
+    }
+    return outcome;
+}
+
+}  // namespace
+
+Handle MakeAutoResetEvent() {
+    return CallMustFail("MakeAutoResetEvent") ? NoHandle : AddIfMade(std::make_shared<EventObject>());
+}
+
+bool SignalEvent(Handle event) {
+    return !CallMustFail("SignalEvent") &&
+           OnObject<EventObject>(event, [](EventObject& object) { return object.Signal(CurrentThread()); });
+}
+
+Handle MakeMutex(const std::string& name) {
+    if (CallMustFail("MakeMutex")) {
+        return NoHandle;
+    }
+    return AddIfMade(name.empty() ? std::make_shared<MutexObject>() : OpenSharedMutex(name));
+}
+
+bool ReleaseMutex(Handle mutex) {
+    return !CallMustFail("ReleaseMutex") &&
+           OnObject<MutexObject>(mutex, [](MutexObject& object) { return object.Release(CurrentThread()); });
+}
+
+Handle MakeSemaphore(std::int32_t initialCount, std::int32_t maximumCount, const std::string& name) {
+    if (CallMustFail("MakeSemaphore")) {
+        return NoHandle;
+    }
+    if (initialCount < 0 || maximumCount <= 0 || initialCount > maximumCount) {
+        SetLastError(Errors::InvalidParameter);
+        return NoHandle;
+    }
+    if (name.empty()) {
+        return AddIfMade(std::make_shared<LocalSemaphore>(initialCount, maximumCount));
+    }
+    return AddIfMade(OpenSharedSemaphore(initialCount, maximumCount, name));
+}
+
+bool ReleaseSemaphore(Handle semaphore, std::int32_t count) {
+    return !CallMustFail("ReleaseSemaphore") &&
+           OnObject<SemaphoreObject>(semaphore,
+                                     [count](SemaphoreObject& object) { return object.Release(count); });
+}
+
+WaitResult Wait(Handle handle, std::uint32_t timeout) {
+    if (CallMustFail("Wait")) {
+        return WaitResult::Failed;
+    }
+    const std::array objects{HandleTable::Instance().Find(handle)};
+    return objects[0] ? WaitForObjects(objects, timeout).result : WaitResult::Failed;
+}
+
+WaitAnyResult WaitAny(std::span<const Handle> handles, std::uint32_t timeout) {
+    if (CallMustFail("WaitAny")) {
+        return {WaitResult::Failed, 0};
+    }
+    if (handles.empty() || handles.size() > MostObjectsPerWait) {
+        SetLastError(Errors::InvalidParameter);
+        return {WaitResult::Failed, 0};
+    }
+    std::vector<ObjectRef> objects;
+    for (const Handle handle : handles) {
+        objects.push_back(HandleTable::Instance().Find(handle));
+        if (!objects.back()) {
+            return {WaitResult::Failed, 0};
+        }
+    }
+    return WaitForObjects(objects, timeout);
+}
+
+WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) {
+    if (CallMustFail("SignalAndWait")) {
+        return WaitResult::Failed;
+    }
+    const ObjectRef signalled = HandleTable::Instance().Find(toSignal);
+    const std::array objects{signalled ? HandleTable::Instance().Find(toWait) : nullptr};
+    if (!objects[0]) {
+        return WaitResult::Failed;
+    }
+    const Microseconds deadline = DeadlineAfter(timeout);
+    WaitResult result{};
+    {
+        KernelHold hold(KernelLock());
+        CurrentClock().Preempt(hold);
+        if (!Succeeded(signalled->Signal(CurrentThread()))) {
+            return WaitResult::Failed;
+        }
+        result = WaitForAny(hold, objects, deadline).result;
+    }
+    if (result == WaitResult::Signalled) {
+        objects[0]->AfterWait();
+    }
+    return result;
+}
+
+}  // namespace Varnholt::Platform
