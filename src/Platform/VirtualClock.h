@@ -13,15 +13,14 @@ namespace Varnholt::Platform {
 /// The clock's threads are the one that made it and those that `StartThread` starts meanwhile. Exactly one of
 /// them runs at a time; a platform call may hand over to another that could run, as the seed decides. When
 /// all wait, the time jumps to the earliest time-out or event of `ClockScheduler`; a tie is decided by the
-/// seed. An event is called on a waiting thread's stack, as if by a thread of its own. Sleeps, waits, tick
-/// count, high-resolution counter, wall clock and events all follow this time; `SleepMilliseconds(0)` with
-/// nobody else to run takes a microsecond, so that a loop that polls comes to an end.
+/// seed. An event is called as if by a thread of its own, often on a waiting thread's stack. Sleeps, waits,
+/// tick count, high-resolution counter, wall clock and events all follow this time; `SleepMilliseconds(0)`
+/// with nobody else to run takes a microsecond, so that a loop that polls comes to an end.
 ///
 /// What the clock asks of the code under test: a thread that waits for another does so by platform calls, and
 /// no lock but those of the platform (`CriticalSection`, a mutex) is held across a platform call that can
 /// block or hand over: waits, sleeps, signals, releases, `StartThread`. (`CallAt`, `Forget` and the time
-/// queries do not hand over.) An event does not need a lock that some thread holds while it waits: its host
-/// may be that thread. Other threads, such as `std::thread`s, may signal and poll but not block.
+/// queries do not hand over.) Other threads, such as `std::thread`s, may signal and poll but not block.
 ///
 /// One at a time; made and ended while no other thread is inside a platform call. The end waits, in virtual
 /// time, for the clock's threads to end, and drops the events that are left.

@@ -91,6 +91,7 @@ void CriticalSection::Enter() {
             impl->lock.lock();
         }
         impl->owner.store(&me, std::memory_order_relaxed);
+        ++me.sectionsHeld;
     }
     ++impl->depth;
 }
@@ -100,6 +101,7 @@ void CriticalSection::Leave() {
         return;
     }
     impl->owner.store(nullptr, std::memory_order_relaxed);
+    --CurrentThread().sectionsHeld;
     Clock& clock = CurrentClock();
     if (clock.TakesTurns()) {
         impl->LeaveInTurn(clock);

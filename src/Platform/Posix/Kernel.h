@@ -28,10 +28,11 @@ class ThreadRecord final {
 
     const std::uint32_t number;  ///< for messages
 
-    // All guarded by the kernel lock, except `priority`, which only the thread itself uses.
+    // All guarded by the kernel lock, except the last two, which only the thread itself uses.
     std::condition_variable turn;
     std::vector<std::shared_ptr<MutexObject>> owned;
     int priority = 0;
+    unsigned sectionsHeld = 0;
 
     // For the virtual clock.
     enum class State {

@@ -8,6 +8,7 @@
 
 #include "Platform/ErrorCodes.h"
 #include "Platform/Posix/RealScheduler.h"
+#include "Platform/Posix/SystemThread.h"
 
 namespace Varnholt::Platform::Posix {
 namespace {
@@ -44,7 +45,10 @@ class Yielding final : public BlockedCall {
 }  // namespace
 
 VirtualTime::VirtualTime(std::uint64_t seed)
-    : randomState(seed), installer(CurrentThread()), threads{&eventThread, &installer} {
+    : randomState(seed),
+      installer(CurrentThread()),
+      threads{&hostedEvent, &eventThread, &installer},
+      threadsAtRest(threads.size()) {
     const KernelHold hold(KernelLock());
     installer.state = State::Running;
     InstallClock(this);
@@ -55,7 +59,7 @@ VirtualTime::~VirtualTime() {
     KernelHold hold(KernelLock());
     WaitingForThreads call(installer);
     awaitingEnd = &call;
-    while (threads.size() > 2 && !call.hopeless) {
+    while (threads.size() > threadsAtRest && !call.hopeless) {
         call.woken = false;
         Block(hold, call, Never);
     }
@@ -65,7 +69,12 @@ VirtualTime::~VirtualTime() {
     dropped.swap(events);
     installer.state = State::Unknown;
     InstallClock(nullptr);
+    eventThreadMustEnd = true;
+    eventThread.turn.notify_one();
     hold.unlock();
+    if (hasEventThread) {
+        pthread_join(systemEventThread, nullptr);
+    }
 }
 
 void VirtualTime::HandleDeadlock(VirtualClock::DeadlockHandler newHandler) {
@@ -208,7 +217,13 @@ void VirtualTime::Advance(KernelHold& hold, ThreadRecord& self) {
     }
     now = std::max(next, now.load());
     if (eventTime < deadline || (eventTime == deadline && Random() % 2 == 0)) {
-        CallEvent(hold, self);
+        if (CanHost(self)) {
+            HostEvent(hold, self);
+        } else {
+            eventThreadMustCall = true;
+            eventThread.turn.notify_one();
+            AwaitTurn(hold, self);
+        }
         return;
     }
     for (ThreadRecord* const thread : threads) {
@@ -218,30 +233,80 @@ void VirtualTime::Advance(KernelHold& hold, ThreadRecord& self) {
     }
 }
 
-void VirtualTime::CallEvent(KernelHold& hold, ThreadRecord& host) {
-    const auto first = events.begin();
-    running = first->first.second;
-    std::function<void()> event = std::move(first->second);
-    events.erase(first);
+bool VirtualTime::CanHost(const ThreadRecord& thread) {
+    if (thread.owned.empty() && thread.sectionsHeld == 0) {
+        return true;
+    }
+    // Without the thread for events, one that needs a lock of its host is reported as a deadlock; nothing
+    // worse.
+    hasEventThread = hasEventThread || StartSystemThread(systemEventThread, RunEventThread, this);
+    return !hasEventThread;
+}
 
+void VirtualTime::HostEvent(KernelHold& hold, ThreadRecord& host) {
     const ErrorCode errorOfHost = LastError();
     host.state = State::Hosting;
-    eventThread.state = State::Running;
-    BindCurrentThread(&eventThread);
+    BindCurrentThread(&hostedEvent);
+    CallEvent(hold, hostedEvent);
+    BindCurrentThread(&host);
+    host.state = IsDue(host) ? State::Ready : State::Blocked;
+    SetLastError(errorOfHost);
+}
+
+/// Calls the first event on the stack of the calling thread, which then has the baton still.
+void VirtualTime::CallEvent(KernelHold& hold, ThreadRecord& as) {
+    const auto first = events.begin();
+    running = first->first.second;
+    runningAs = &as;
+    std::function<void()> event = std::move(first->second);
+    events.erase(first);
+    as.state = State::Running;
     hold.unlock();
     event();
     event = nullptr;
     hold.lock();
-    BindCurrentThread(&host);
-    SetLastError(errorOfHost);
-
+    as.state = State::Unknown;
     running = 0;
-    eventThread.state = State::Unknown;
-    host.state = IsDue(host) ? State::Ready : State::Blocked;
+    runningAs = nullptr;
     for (BlockedCall* const call : std::exchange(forgetting, {})) {
         Wake(*call);
     }
     eventEnded.notify_all();
+}
+
+void* VirtualTime::RunEventThread(void* time) {
+    KernelHold hold(KernelLock());
+    static_cast<VirtualTime*>(time)->ServeEvents(hold);
+    return nullptr;
+}
+
+void VirtualTime::ServeEvents(KernelHold& hold) {
+    BindCurrentThread(&eventThread);
+    while (true) {
+        eventThread.turn.wait(hold, [this] { return eventThreadMustCall || eventThreadMustEnd; });
+        if (eventThreadMustEnd) {
+            BindCurrentThread(nullptr);
+            return;
+        }
+        eventThreadMustCall = false;
+        CallEvent(hold, eventThread);
+        PassOn();
+    }
+}
+
+/// The calling thread leaves the others to themselves. It does not move the time on if nobody is ready, but
+/// has one of them do it: who waits for a thread's end waits for the system's thread as well, and an event on
+/// this stack could need that other thread. Somebody is blocked, at least the installer or the event that it
+/// hosts.
+void VirtualTime::PassOn() {
+    if (ThreadRecord* const next = ChooseReady()) {
+        next->state = State::Running;
+        next->turn.notify_one();
+        return;
+    }
+    const auto blocked = std::ranges::find(threads, State::Blocked, &ThreadRecord::state);
+    (*blocked)->mustAdvance = true;
+    (*blocked)->turn.notify_one();
 }
 
 void VirtualTime::ThreadMade(KernelHold& /*hold*/, ThreadRecord& thread) {
@@ -265,20 +330,10 @@ void VirtualTime::ThreadEnds(KernelHold& /*hold*/, ThreadRecord& thread) {
     }
     thread.state = State::Unknown;
     std::erase(threads, &thread);
-    if (awaitingEnd && threads.size() == 2) {
+    if (awaitingEnd && threads.size() == threadsAtRest) {
         Wake(*awaitingEnd);
     }
-    if (ThreadRecord* const next = ChooseReady()) {
-        next->state = State::Running;
-        next->turn.notify_one();
-        return;
-    }
-    // Not to be done here: who waits for this thread's end waits for the system's thread as well, and an
-    // event on its stack could need that other thread. Somebody is blocked, at least the installer or the
-    // event that it hosts.
-    const auto blocked = std::ranges::find(threads, State::Blocked, &ThreadRecord::state);
-    (*blocked)->mustAdvance = true;
-    (*blocked)->turn.notify_one();
+    PassOn();
 }
 
 EventScheduler::EventId VirtualTime::CallAt(std::uint64_t time, std::function<void()> event) {
@@ -297,7 +352,7 @@ void VirtualTime::Forget(EventId id) {
     if (found != events.end()) {
         dropped = std::move(found->second);
         events.erase(found);
-    } else if (running == id && &self != &eventThread) {
+    } else if (running == id && &self != runningAs) {
         if (self.state == State::Running) {
             WaitingForEvent call(self);
             forgetting.push_back(&call);
@@ -333,8 +388,9 @@ std::string VirtualTime::DescribeThreads() const {
         if (thread->state == State::Unknown) {
             continue;
         }
-        text += thread == &eventThread ? "  the event that is running"
-                                       : "  thread " + std::to_string(thread->number);
+        text += thread == &hostedEvent || thread == &eventThread
+                    ? "  the event that is running"
+                    : "  thread " + std::to_string(thread->number);
         text += thread == &installer ? " (made the clock)" : "";
         text += thread->call ? " waits for " + thread->call->Describe() : " could run";
         text += thread->state == State::Hosting ? ", and an event runs on its stack\n" : "\n";

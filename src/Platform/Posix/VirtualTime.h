@@ -1,5 +1,7 @@
 #pragma once
 
+#include <pthread.h>
+
 #include <atomic>
 #include <condition_variable>
 #include <map>
@@ -17,8 +19,9 @@ namespace Varnholt::Platform::Posix {
 ///
 /// Who may run is passed on like a baton: the record of the thread that has it is in state `Running`, and a
 /// thread whose record is not waits at its own condition variable. Whoever finds that nobody is `Ready` moves
-/// the time on, and calls the event that is due on its own stack, but under a record of the event's own: a
-/// lock that the host of the event holds is not the event's, though both are on one stack.
+/// the time on and sees to the event that is due. One that holds no lock calls it on its own stack, which
+/// saves two changes of threads, but under a record of the event's own. One that holds a lock leaves it to a
+/// thread for events: an event that needs the lock could not wait for it on the stack of its owner.
 class VirtualTime final : public Clock, private EventScheduler {
   public:
     explicit VirtualTime(std::uint64_t seed);
@@ -57,7 +60,12 @@ class VirtualTime final : public Clock, private EventScheduler {
     void HandOver(KernelHold& hold, ThreadRecord& self);
     void AwaitTurn(KernelHold& hold, ThreadRecord& self);
     void Advance(KernelHold& hold, ThreadRecord& self);
-    void CallEvent(KernelHold& hold, ThreadRecord& host);
+    bool CanHost(const ThreadRecord& thread);
+    void HostEvent(KernelHold& hold, ThreadRecord& host);
+    void CallEvent(KernelHold& hold, ThreadRecord& as);
+    void PassOn();
+    static void* RunEventThread(void* time);
+    void ServeEvents(KernelHold& hold);
     void ReportDeadlock(KernelHold& hold);
     std::string DescribeThreads() const;
 
@@ -67,10 +75,19 @@ class VirtualTime final : public Clock, private EventScheduler {
     std::atomic<Microseconds> now = Start;
     std::uint64_t randomState;
     ThreadRecord& installer;
-    ThreadRecord eventThread;
+    ThreadRecord hostedEvent;
     std::vector<ThreadRecord*> threads;  ///< in the order in which they were made
+    std::size_t threadsAtRest;           ///< of `threads`, without those that `StartThread` has started
+
+    ThreadRecord eventThread;
+    pthread_t systemEventThread{};
+    bool hasEventThread = false;
+    bool eventThreadMustCall = false;
+    bool eventThreadMustEnd = false;
+
     std::map<std::pair<Microseconds, EventId>, std::function<void()>> events;
     EventId running = 0;
+    const ThreadRecord* runningAs = nullptr;
     std::condition_variable eventEnded;     ///< for threads that do not take turns
     std::vector<BlockedCall*> forgetting;   ///< wait for the running event's end
     BlockedCall* awaitingEnd = nullptr;     ///< of the clock's own end
