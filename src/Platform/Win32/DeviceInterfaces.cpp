@@ -1,15 +1,13 @@
 #include "Platform/DeviceInterfaces.h"
 
-#include <cstddef>
 #include <cstring>
 #include <memory>
-#include <new>
-#include <optional>
 
 #include "Platform/CallFilter.h"
 #include "Platform/DeviceFiles.h"
+#include "Platform/DeviceListTable.h"
 #include "Platform/HostQueries.h"
-#include "Platform/ListedInterfaces.h"
+#include "Platform/Win32/InterfaceList.h"
 #include "Platform/Win32/RegistryInterfaces.h"
 #include "Platform/Win32/SetupApi.h"
 #include "Platform/Win32/SystemInterfaces.h"
@@ -17,35 +15,9 @@
 namespace Varnholt::Platform {
 namespace {
 
-// setupapi takes and gives these records as they are.
-static_assert(sizeof(InterfaceRecord) == 28 && sizeof(InterfaceRecord) == sizeof(SP_DEVICE_INTERFACE_DATA));
-static_assert(offsetof(InterfaceRecord, interfaceClass) ==
-              offsetof(SP_DEVICE_INTERFACE_DATA, InterfaceClassGuid));
-static_assert(offsetof(InterfaceRecord, flags) == offsetof(SP_DEVICE_INTERFACE_DATA, Flags));
-static_assert(offsetof(InterfaceRecord, reserved) == offsetof(SP_DEVICE_INTERFACE_DATA, Reserved));
-static_assert(InterfaceDetailSizeField == sizeof(SP_DEVICE_INTERFACE_DETAIL_DATA_A));
-static_assert(InterfaceDetailPathOffset == offsetof(SP_DEVICE_INTERFACE_DETAIL_DATA_A, DevicePath));
-static_assert(sizeof(Protocol::Guid) == sizeof(GUID));
-
 SetupApi setupApi;
 
-/// What a `DeviceList` points to: setupapi's list, or a list of paths where setupapi is not asked.
-struct List {
-    HDEVINFO deviceInfo = nullptr;
-    std::optional<ListedInterfaces> listed;
-};
-
-List* Get(DeviceList list) {
-    return static_cast<List*>(list);
-}
-
-const GUID* SystemGuid(const Protocol::Guid& guid) {
-    return reinterpret_cast<const GUID*>(&guid);
-}
-
-SP_DEVICE_INTERFACE_DATA SystemRecord(const InterfaceRecord& record) {
-    return {record.size, *SystemGuid(record.interfaceClass), record.flags, record.reserved};
-}
+DeviceListTable<InterfaceList> lists;  // behind setupApi, which its lists need to their end
 
 bool FilesAreReplaced() {
     return &DeviceFiles() != &SystemDeviceFiles();
@@ -58,63 +30,33 @@ bool HostKeepsInterfacesInRegistry() {
     return version.platformId == NtFamily && version.major < 5;
 }
 
-/// Null on failure, also where setupapi says it with its invalid handle.
-HDEVINFO AskForPresentInterfaces(const Protocol::Guid& interfaceClass) {
-    const SetupApi::EntryPoints* api = setupApi.Load();
-    if (api == nullptr) {
-        return nullptr;
-    }
-    const HDEVINFO deviceInfo = api->getClassDevs(SystemGuid(interfaceClass), nullptr, nullptr,
-                                                  DIGCF_PRESENT | DIGCF_DEVICEINTERFACE);
-    return deviceInfo == InvalidHandle() ? nullptr : deviceInfo;
-}
-
-/// Makes the list that the system itself has.
-DeviceList MakeSystemList(const Protocol::Guid& interfaceClass, bool withRegistryFallback) {
-    auto list = std::make_unique<List>();
+/// The list that the system itself has.
+std::shared_ptr<InterfaceList> MakeSystemList(const Protocol::Guid& interfaceClass,
+                                              bool withRegistryFallback) {
     if (withRegistryFallback && HostKeepsInterfacesInRegistry()) {
-        list->listed.emplace(interfaceClass, ListRegistryInterfaces(interfaceClass));
-    } else {
-        list->deviceInfo = AskForPresentInterfaces(interfaceClass);
-        if (list->deviceInfo == nullptr) {
-            return nullptr;
-        }
+        return MakePathList(interfaceClass, ListRegistryInterfaces(interfaceClass));
     }
-    return list.release();
+    return MakeSetupApiList(setupApi, interfaceClass);
 }
 
 }  // namespace
 
 bool DeviceInterfaces::Load() {
-    return FilesAreReplaced() ? !CallMustFail("LoadEnumeration") : setupApi.Load() != nullptr;
+    return !CallMustFail("LoadEnumeration") && (FilesAreReplaced() || setupApi.Load() != nullptr);
 }
 
 DeviceList DeviceInterfaces::MakeList(const Protocol::Guid& interfaceClass, bool withRegistryFallback) {
-    if (CallMustFail("MakeList")) {
+    if (CallMustFail("LoadEnumeration") || CallMustFail("MakeList")) {
         return nullptr;
     }
-    if (!FilesAreReplaced()) {
-        return MakeSystemList(interfaceClass, withRegistryFallback);
-    }
-    if (!Load()) {
-        return nullptr;
-    }
-    auto list = std::make_unique<List>();
-    list->listed.emplace(interfaceClass, DeviceFiles().ListInterfaces(interfaceClass));
-    return list.release();
+    auto list = FilesAreReplaced()
+                    ? MakePathList(interfaceClass, DeviceFiles().ListInterfaces(interfaceClass))
+                    : MakeSystemList(interfaceClass, withRegistryFallback);
+    return list ? lists.Add(std::move(list)) : nullptr;
 }
 
 bool DeviceInterfaces::DestroyList(DeviceList list) {
-    const std::unique_ptr<List> owned(Get(list));
-    if (owned == nullptr) {
-        SetLastError(Errors::InvalidHandle);
-        return false;
-    }
-    if (owned->listed) {
-        return true;
-    }
-    const SetupApi::EntryPoints* api = setupApi.Load();
-    return api != nullptr && api->destroyDeviceInfoList(owned->deviceInfo) != 0;
+    return lists.Remove(list) != nullptr;
 }
 
 bool DeviceInterfaces::Find(DeviceList list, const Protocol::Guid& interfaceClass, std::uint32_t index,
@@ -122,36 +64,16 @@ bool DeviceInterfaces::Find(DeviceList list, const Protocol::Guid& interfaceClas
     if (CallMustFail("FindInterface")) {
         return false;
     }
-    if (list == nullptr) {
-        SetLastError(Errors::InvalidHandle);
-        return false;
-    }
-    if (const auto& listed = Get(list)->listed) {
-        return listed->Find(interfaceClass, index, record);
-    }
-    const SetupApi::EntryPoints* api = setupApi.Load();
-    return api != nullptr &&
-           api->enumDeviceInterfaces(Get(list)->deviceInfo, nullptr, SystemGuid(interfaceClass), index,
-                                     reinterpret_cast<SP_DEVICE_INTERFACE_DATA*>(&record)) != 0;
+    const auto found = lists.Find(list);
+    return found && found->Find(interfaceClass, index, record);
 }
 
 std::uint32_t DeviceInterfaces::DetailSize(DeviceList list, const InterfaceRecord& record) {
     if (CallMustFail("DetailSize")) {
         return 0;
     }
-    if (list == nullptr) {
-        SetLastError(Errors::InvalidHandle);
-        return 0;
-    }
-    if (const auto& listed = Get(list)->listed) {
-        return listed->DetailSize(record);
-    }
-    DWORD size = 0;
-    if (const SetupApi::EntryPoints* api = setupApi.Load()) {
-        SP_DEVICE_INTERFACE_DATA systemRecord = SystemRecord(record);
-        api->getDeviceInterfaceDetail(Get(list)->deviceInfo, &systemRecord, nullptr, 0, &size, nullptr);
-    }
-    return size;
+    const auto found = lists.Find(list);
+    return found ? found->DetailSize(record) : 0;
 }
 
 bool DeviceInterfaces::ReadDetail(DeviceList list, const InterfaceRecord& record,
@@ -159,41 +81,27 @@ bool DeviceInterfaces::ReadDetail(DeviceList list, const InterfaceRecord& record
     if (CallMustFail("ReadDetail")) {
         return false;
     }
-    if (list == nullptr) {
-        SetLastError(Errors::InvalidHandle);
-        return false;
-    }
-    if (const auto& listed = Get(list)->listed) {
-        return listed->ReadDetail(record, detail);
-    }
-    const SetupApi::EntryPoints* api = setupApi.Load();
-    if (api == nullptr) {
-        return false;
-    }
-    SP_DEVICE_INTERFACE_DATA systemRecord = SystemRecord(record);
-    return api->getDeviceInterfaceDetail(Get(list)->deviceInfo, &systemRecord,
-                                         reinterpret_cast<SP_DEVICE_INTERFACE_DETAIL_DATA_A*>(detail.data()),
-                                         static_cast<DWORD>(detail.size()), nullptr, nullptr) != 0;
+    const auto found = lists.Find(list);
+    return found && found->ReadDetail(record, detail);
 }
 
 std::vector<std::string> ListSystemInterfaces(const Protocol::Guid& interfaceClass) {
     std::vector<std::string> paths;
-    const DeviceList list = MakeSystemList(interfaceClass, true);
+    const std::shared_ptr<InterfaceList> list = MakeSystemList(interfaceClass, true);
     if (list == nullptr) {
         return paths;
     }
     InterfaceRecord record;
-    for (std::uint32_t index = 0; DeviceInterfaces::Find(list, interfaceClass, index, record); ++index) {
-        std::vector<std::byte> detail(DeviceInterfaces::DetailSize(list, record));
+    for (std::uint32_t index = 0; list->Find(interfaceClass, index, record); ++index) {
+        std::vector<std::byte> detail(list->DetailSize(record));
         if (detail.size() <= InterfaceDetailPathOffset) {
             continue;
         }
         std::memcpy(detail.data(), &InterfaceDetailSizeField, sizeof InterfaceDetailSizeField);
-        if (DeviceInterfaces::ReadDetail(list, record, detail)) {
+        if (list->ReadDetail(record, detail)) {
             paths.emplace_back(reinterpret_cast<const char*>(detail.data() + InterfaceDetailPathOffset));
         }
     }
-    DeviceInterfaces::DestroyList(list);
     return paths;
 }
 

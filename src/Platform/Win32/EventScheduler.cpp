@@ -1,9 +1,11 @@
 #include "Platform/EventScheduler.h"
 
+#include <algorithm>
 #include <chrono>
 #include <condition_variable>
 #include <map>
 #include <mutex>
+#include <system_error>
 #include <thread>
 #include <utility>
 
@@ -14,18 +16,6 @@ namespace {
 /// the platform's calls must not hit the device as well.
 class RealTimeScheduler final : public EventScheduler {
   public:
-    ~RealTimeScheduler() override {
-        {
-            const std::lock_guard held(lock);
-            stopping = true;
-            waiting.clear();
-            changed.notify_all();
-        }
-        if (thread.joinable()) {
-            thread.join();
-        }
-    }
-
     std::uint64_t Now() override {
         const auto sinceStart = Clock::now().time_since_epoch();
         return static_cast<std::uint64_t>(
@@ -35,33 +25,46 @@ class RealTimeScheduler final : public EventScheduler {
     EventId CallAt(std::uint64_t time, std::function<void()> event) override {
         const std::lock_guard held(lock);
         const EventId id = ++lastId;
-        if (stopping) {
-            return id;
-        }
         waiting.emplace(std::pair(time, id), std::move(event));
         if (threadRuns) {
             changed.notify_all();
         } else {
-            if (thread.joinable()) {
-                thread.join();  // it has seen that nothing was waiting, and takes the lock no more
-            }
-            thread = std::thread([this] { Run(); });
-            threadRuns = true;
+            StartThread();
         }
         return id;
     }
 
     void Forget(EventId id) override {
+        Event dropped;  // what it holds may be anything: it goes without the lock
         std::unique_lock held(lock);
-        std::erase_if(waiting, [id](const auto& entry) { return entry.first.second == id; });
+        const auto found =
+            std::ranges::find_if(waiting, [id](const auto& entry) { return entry.first.second == id; });
+        if (found != waiting.end()) {
+            dropped = std::move(found->second);
+            waiting.erase(found);
+            changed.notify_all();
+        }
         if (std::this_thread::get_id() != thread.get_id()) {
             changed.wait(held, [this, id] { return inCall != id; });
         }
-        changed.notify_all();
+        held.unlock();
     }
 
   private:
     using Clock = std::chrono::steady_clock;
+    using Event = std::function<void()>;
+
+    void StartThread() {
+        if (thread.joinable()) {
+            thread.join();  // it has seen that nothing was waiting, and takes the lock no more
+        }
+        try {
+            thread = std::thread([this] { Run(); });
+            threadRuns = true;
+        } catch (const std::system_error&) {
+            // Without a thread the events wait for the next call that can have one: late, but not lost.
+        }
+    }
 
     void Run() {
         std::unique_lock held(lock);
@@ -72,11 +75,12 @@ class RealTimeScheduler final : public EventScheduler {
                 changed.wait_for(held, std::chrono::microseconds(time - Now()));
                 continue;
             }
-            const std::function<void()> event = std::move(first->second);
+            Event event = std::move(first->second);
             waiting.erase(first);
             inCall = id;
             held.unlock();
             event();
+            event = nullptr;
             held.lock();
             inCall = 0;
             changed.notify_all();
@@ -84,21 +88,20 @@ class RealTimeScheduler final : public EventScheduler {
         threadRuns = false;
     }
 
-    std::mutex lock;  // guards all below
+    std::mutex lock;  // guards all below; nothing else is called while it is held
     std::condition_variable changed;
-    std::map<std::pair<std::uint64_t, EventId>, std::function<void()>>
-        waiting;  // by time, then in order of asking
+    std::map<std::pair<std::uint64_t, EventId>, Event> waiting;  // by time, then in order of asking
     EventId lastId = 0;
     EventId inCall = 0;
     bool threadRuns = false;
-    bool stopping = false;
     std::thread thread;
 };
 
 }  // namespace
 
 EventScheduler& ClockScheduler() {
-    static RealTimeScheduler scheduler;
+    // Never destroyed: that would be at the unloading of a library, when no thread can be waited for.
+    static auto& scheduler = *new RealTimeScheduler;
     return scheduler;
 }
 

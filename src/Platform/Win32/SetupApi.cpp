@@ -1,7 +1,5 @@
 #include "Platform/Win32/SetupApi.h"
 
-#include "Platform/CallFilter.h"
-
 namespace Varnholt::Platform {
 
 SetupApi::~SetupApi() {
@@ -9,9 +7,6 @@ SetupApi::~SetupApi() {
 }
 
 const SetupApi::EntryPoints* SetupApi::Load() {
-    if (CallMustFail("LoadEnumeration")) {
-        return nullptr;
-    }
     const std::lock_guard held(lock);
     if (module != nullptr) {
         return &entryPoints;

@@ -1,5 +1,7 @@
 #include "Platform/WaitableObjects.h"
 
+#include <algorithm>
+
 #include "Platform/CallFilter.h"
 #include "Platform/Win32/Windows.h"
 
@@ -11,6 +13,16 @@ static_assert(static_cast<DWORD>(WaitResult::Abandoned) == WAIT_ABANDONED_0);
 static_assert(static_cast<DWORD>(WaitResult::TimedOut) == WAIT_TIMEOUT);
 static_assert(static_cast<DWORD>(WaitResult::Failed) == WAIT_FAILED);
 static_assert(Infinite == INFINITE);
+
+/// The value of a failed open also stands for the current process, which can be waited for: that is never
+/// meant.
+bool Refused(Handle handle) {
+    if (handle == InvalidHandle()) {
+        SetLastError(Errors::InvalidHandle);
+        return true;
+    }
+    return false;
+}
 
 const char* NameOrNull(const std::string& name) {
     return name.empty() ? nullptr : name.c_str();
@@ -24,7 +36,7 @@ Handle InvalidHandle() {
 }
 
 bool Close(Handle handle) {
-    return ::CloseHandle(handle) != 0;
+    return !Refused(handle) && ::CloseHandle(handle) != 0;
 }
 
 Handle MakeAutoResetEvent() {
@@ -54,14 +66,14 @@ bool ReleaseSemaphore(Handle semaphore, std::int32_t count) {
 }
 
 WaitResult Wait(Handle object, std::uint32_t timeout) {
-    if (CallMustFail("Wait")) {
+    if (CallMustFail("Wait") || Refused(object)) {
         return WaitResult::Failed;
     }
     return static_cast<WaitResult>(::WaitForSingleObject(object, timeout));
 }
 
 WaitAnyResult WaitAny(std::span<const Handle> objects, std::uint32_t timeout) {
-    if (CallMustFail("WaitAny")) {
+    if (CallMustFail("WaitAny") || std::ranges::any_of(objects, Refused)) {
         return {WaitResult::Failed, 0};
     }
     const auto count = static_cast<DWORD>(objects.size());
@@ -76,7 +88,7 @@ WaitAnyResult WaitAny(std::span<const Handle> objects, std::uint32_t timeout) {
 }
 
 WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) {
-    if (CallMustFail("SignalAndWait")) {
+    if (CallMustFail("SignalAndWait") || Refused(toSignal) || Refused(toWait)) {
         return WaitResult::Failed;
     }
     return static_cast<WaitResult>(::SignalObjectAndWait(toSignal, toWait, timeout, FALSE));

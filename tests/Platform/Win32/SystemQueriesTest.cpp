@@ -66,6 +66,9 @@ TEST(SystemInterfaces, ClassWithoutDevicesGivesAnEmptyList) {
     std::memcpy(detail.data(), &InterfaceDetailSizeField, sizeof InterfaceDetailSizeField);
     EXPECT_FALSE(DeviceInterfaces::ReadDetail(list, record, detail));
     EXPECT_TRUE(DeviceInterfaces::DestroyList(list));
+    EXPECT_FALSE(DeviceInterfaces::Find(list, InterfaceClass, 0, record));
+    EXPECT_EQ(LastError(), Errors::InvalidHandle);
+    EXPECT_FALSE(DeviceInterfaces::DestroyList(list));
 }
 
 TEST(SystemInterfaces, RecordOfAnotherSizeIsRefused) {

@@ -1,0 +1,96 @@
+#include "Platform/Win32/InterfaceList.h"
+
+#include <utility>
+
+#include "Platform/Handle.h"
+#include "Platform/ListedInterfaces.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+// setupapi takes and gives these records as they are.
+static_assert(sizeof(InterfaceRecord) == 28 && sizeof(InterfaceRecord) == sizeof(SP_DEVICE_INTERFACE_DATA));
+static_assert(offsetof(InterfaceRecord, interfaceClass) ==
+              offsetof(SP_DEVICE_INTERFACE_DATA, InterfaceClassGuid));
+static_assert(offsetof(InterfaceRecord, flags) == offsetof(SP_DEVICE_INTERFACE_DATA, Flags));
+static_assert(offsetof(InterfaceRecord, reserved) == offsetof(SP_DEVICE_INTERFACE_DATA, Reserved));
+static_assert(InterfaceDetailSizeField == sizeof(SP_DEVICE_INTERFACE_DETAIL_DATA_A));
+static_assert(InterfaceDetailPathOffset == offsetof(SP_DEVICE_INTERFACE_DETAIL_DATA_A, DevicePath));
+static_assert(sizeof(Protocol::Guid) == sizeof(GUID));
+
+const GUID* SystemGuid(const Protocol::Guid& guid) {
+    return reinterpret_cast<const GUID*>(&guid);
+}
+
+SP_DEVICE_INTERFACE_DATA SystemRecord(const InterfaceRecord& record) {
+    return {record.size, *SystemGuid(record.interfaceClass), record.flags, record.reserved};
+}
+
+class SetupApiList final : public InterfaceList {
+  public:
+    SetupApiList(const SetupApi::EntryPoints& entryPoints, HDEVINFO deviceInfo)
+        : api(entryPoints), list(deviceInfo) {}
+    ~SetupApiList() override { api.destroyDeviceInfoList(list); }
+
+    bool Find(const Protocol::Guid& interfaceClass, std::uint32_t index, InterfaceRecord& record) override {
+        return api.enumDeviceInterfaces(list, nullptr, SystemGuid(interfaceClass), index,
+                                        reinterpret_cast<SP_DEVICE_INTERFACE_DATA*>(&record)) != 0;
+    }
+
+    std::uint32_t DetailSize(const InterfaceRecord& record) override {
+        SP_DEVICE_INTERFACE_DATA systemRecord = SystemRecord(record);
+        DWORD size = 0;
+        api.getDeviceInterfaceDetail(list, &systemRecord, nullptr, 0, &size, nullptr);
+        return size;
+    }
+
+    bool ReadDetail(const InterfaceRecord& record, std::span<std::byte> detail) override {
+        SP_DEVICE_INTERFACE_DATA systemRecord = SystemRecord(record);
+        return api.getDeviceInterfaceDetail(
+                   list, &systemRecord, reinterpret_cast<SP_DEVICE_INTERFACE_DETAIL_DATA_A*>(detail.data()),
+                   static_cast<DWORD>(detail.size()), nullptr, nullptr) != 0;
+    }
+
+  private:
+    const SetupApi::EntryPoints& api;
+    const HDEVINFO list;
+};
+
+class PathList final : public InterfaceList {
+  public:
+    PathList(const Protocol::Guid& interfaceClass, std::vector<std::string> paths)
+        : listed(interfaceClass, std::move(paths)) {}
+
+    bool Find(const Protocol::Guid& interfaceClass, std::uint32_t index, InterfaceRecord& record) override {
+        return listed.Find(interfaceClass, index, record);
+    }
+    std::uint32_t DetailSize(const InterfaceRecord& record) override { return listed.DetailSize(record); }
+    bool ReadDetail(const InterfaceRecord& record, std::span<std::byte> detail) override {
+        return listed.ReadDetail(record, detail);
+    }
+
+  private:
+    const ListedInterfaces listed;
+};
+
+}  // namespace
+
+std::shared_ptr<InterfaceList> MakeSetupApiList(SetupApi& setupApi, const Protocol::Guid& interfaceClass) {
+    const SetupApi::EntryPoints* api = setupApi.Load();
+    if (api == nullptr) {
+        return nullptr;
+    }
+    const HDEVINFO list = api->getClassDevs(SystemGuid(interfaceClass), nullptr, nullptr,
+                                            DIGCF_PRESENT | DIGCF_DEVICEINTERFACE);
+    if (list == nullptr || list == InvalidHandle()) {
+        return nullptr;
+    }
+    return std::make_shared<SetupApiList>(*api, list);
+}
+
+std::shared_ptr<InterfaceList> MakePathList(const Protocol::Guid& interfaceClass,
+                                            std::vector<std::string> paths) {
+    return std::make_shared<PathList>(interfaceClass, std::move(paths));
+}
+
+}  // namespace Varnholt::Platform
