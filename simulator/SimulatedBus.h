@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "FaultPlan.h"
 #include "Platform/EventScheduler.h"
 #include "Platform/Usb/UsbDevice.h"
 #include "SimulatedInstrument.h"
@@ -33,8 +34,12 @@ class SimulatedBus final : public Platform::Usb::UsbBus {
     void Unplug(const std::string& name) { Instrument(name).Unplug(); }
     void PlugIn(const std::string& name) { Instrument(name).PlugIn(); }
 
-    /// Puts something in front of every device that is opened from now on: a fault injector, a recorder. Null
-    /// takes it away again.
+    /// Every device opened from now on under this name suffers the faults of the plan, which counts transfers
+    /// across openings. A fault that takes the device away unplugs the instrument. An empty plan ends them.
+    std::shared_ptr<FaultScript> SetFaults(const std::string& name, FaultPlan plan);
+
+    /// Puts something in front of every device that is opened from now on, in front of its faults: a
+    /// recorder, a capture. Null takes it away again.
     using Wrapper = std::function<std::shared_ptr<Platform::Usb::UsbDevice>(
         const std::string& name, std::shared_ptr<Platform::Usb::UsbDevice> device)>;
     void WrapDevices(Wrapper devicesWrapper);
@@ -43,6 +48,7 @@ class SimulatedBus final : public Platform::Usb::UsbBus {
     Platform::EventScheduler& scheduler;
     std::mutex mutex;  // guards what follows
     std::map<std::string, std::shared_ptr<SimulatedInstrument>> instruments;
+    std::map<std::string, std::shared_ptr<FaultScript>> faults;
     Wrapper wrapper;
 };
 

@@ -1,0 +1,478 @@
+#include "FaultInjector.h"
+
+#include <algorithm>
+#include <atomic>
+#include <map>
+#include <mutex>
+#include <new>
+#include <set>
+#include <utility>
+#include <vector>
+
+#include "Platform/Threads.h"
+
+namespace Varnholt::Simulator {
+
+using Platform::ErrorCode;
+using Platform::Usb::EndpointInfo;
+using Platform::Usb::Transfer;
+using Platform::Usb::TransferClient;
+using Platform::Usb::TransferStatus;
+using Platform::Usb::UsbDevice;
+namespace Errors = Platform::Errors;
+
+namespace {
+
+using Bytes = std::vector<std::uint8_t>;
+
+void FillWithGarbage(std::uint8_t* data, std::size_t length, std::uint32_t seed) {
+    std::uint32_t state = seed * 2654435761U + 1;
+    for (std::size_t i = 0; i < length; ++i) {
+        state = state * 1664525U + 1013904223U;
+        data[i] = static_cast<std::uint8_t>(state >> 24);
+    }
+}
+
+void FlipBit(std::uint8_t* data, std::size_t length, std::uint32_t bit) {
+    if (length > 0) {
+        data[bit / 8 % length] ^= static_cast<std::uint8_t>(1U << bit % 8);
+    }
+}
+
+/// A transfer on its way through the injector: the copy that the device gets, and how far it is.
+struct Passage : Transfer {
+    enum class State {
+        Held,          ///< not with the device
+        Submitting,    ///< being handed to the device
+        InDevice,      ///< accepted by the device
+        HeldWithData,  ///< done by the device, waits for its cancellation
+    };
+
+    Transfer* original = nullptr;
+    std::optional<Fault> fault;
+    State state = State::Held;
+    bool cancelWanted = false;
+    Bytes replacedData;  // of an OUT transfer whose data are changed
+
+    bool Has(FaultKind kind) const { return fault && fault->kind == kind; }
+};
+using PassagePointer = std::shared_ptr<Passage>;
+
+void Shorten(Passage& passage, std::uint32_t length) {
+    passage.length = std::min(passage.length, length);
+    if (passage.endpoint == 0) {
+        passage.setup.length = static_cast<std::uint16_t>(passage.length);
+    }
+}
+
+class FaultInjector final : public UsbDevice, private TransferClient {
+  public:
+    FaultInjector(std::shared_ptr<UsbDevice> behind, std::shared_ptr<FaultScript> faultScript,
+                  Platform::EventScheduler& eventScheduler, std::function<void()> unplugDevice)
+        : device(std::move(behind)),
+          script(std::move(faultScript)),
+          scheduler(eventScheduler),
+          unplug(std::move(unplugDevice)),
+          keepsData(script->Plan().Uses(FaultKind::Stale)) {}
+    ~FaultInjector() override;
+
+    std::vector<EndpointInfo> Endpoints() override { return device->Endpoints(); }
+    ErrorCode Claim() override { return Gone() ? Errors::DeviceNotConnected : device->Claim(); }
+    void Release() override { device->Release(); }
+    ErrorCode Submit(Transfer& transfer) override;
+    void Cancel(Transfer& transfer) override;
+    ErrorCode ClearHalt(std::uint8_t endpoint) override;
+
+  private:
+    using EventId = Platform::EventScheduler::EventId;
+
+    ErrorCode Begin(const PassagePointer& passage);
+    ErrorCode PassOn(const PassagePointer& passage);
+    void ReplaceOutData(Passage& passage);
+    void AnswerWithLastData(const PassagePointer& passage);
+    void HoldFor(const PassagePointer& passage, std::uint32_t milliseconds);
+    void TimeHasCome(const PassagePointer& passage);
+    void TransferCompleted(Transfer& transfer) noexcept override;
+    void ChangeOutcome(Passage& passage);
+    void UnplugDevice();
+
+    /// Takes a transfer out of the ones under way; null when it has ended already.
+    PassagePointer TakeOut(const Passage& passage);
+    /// Ends a transfer unless it has ended already.
+    void End(const Passage& passage, TransferStatus status, std::uint32_t actualLength);
+    bool Gone();
+
+    const std::shared_ptr<UsbDevice> device;
+    const std::shared_ptr<FaultScript> script;
+    Platform::EventScheduler& scheduler;
+    const std::function<void()> unplug;
+    const bool keepsData;
+
+    std::mutex mutex;  // guards what follows; not held while the device, a client or the scheduler is called
+    std::map<const Transfer*, PassagePointer> passages;  // under way, by the submitter's own
+    std::map<const Passage*, EventId> alarms;
+    std::set<std::uint8_t> halted;
+    std::map<std::pair<std::uint8_t, bool>, Bytes> lastData;  // by endpoint and direction
+    bool gone = false;
+
+    std::atomic<int> completing = 0;  // completions by the device that are being dealt with
+};
+
+FaultInjector::~FaultInjector() {
+    std::map<const Passage*, EventId> waiting;
+    {
+        const std::lock_guard lock(mutex);
+        waiting.swap(alarms);
+    }
+    for (const auto& [passage, alarm] : waiting) {
+        scheduler.Forget(alarm);
+    }
+    std::vector<PassagePointer> open;
+    {
+        const std::lock_guard lock(mutex);
+        for (const auto& [original, passage] : passages) {
+            open.push_back(passage);
+        }
+    }
+    for (const PassagePointer& passage : open) {
+        Cancel(*passage->original);
+    }
+    const auto quiet = [this] {
+        const std::lock_guard lock(mutex);
+        return passages.empty() && completing == 0;
+    };
+    while (!quiet()) {
+        Platform::SleepMilliseconds(1);
+    }
+}
+
+bool FaultInjector::Gone() {
+    const std::lock_guard lock(mutex);
+    return gone;
+}
+
+ErrorCode FaultInjector::Submit(Transfer& transfer) try {
+    const auto passage = std::make_shared<Passage>();
+    static_cast<Transfer&>(*passage) = transfer;
+    passage->client = this;
+    passage->deviceData = nullptr;
+    passage->original = &transfer;
+    {
+        const std::lock_guard lock(mutex);
+        if (gone) {
+            return Errors::DeviceNotConnected;
+        }
+        passages[&transfer] = passage;
+        passage->fault = script->Next(transfer.endpoint);
+        if (passage->Has(FaultKind::Stall) && transfer.endpoint != 0) {
+            halted.insert(transfer.endpoint);
+        } else if (halted.contains(transfer.endpoint)) {
+            passage->fault = Fault{};
+            passage->fault->kind = FaultKind::Stall;
+        }
+    }
+    try {
+        return Begin(passage);
+    } catch (...) {
+        TakeOut(*passage);
+        throw;
+    }
+} catch (const std::bad_alloc&) {
+    return Errors::NotEnoughMemory;
+}
+
+ErrorCode FaultInjector::Begin(const PassagePointer& passage) {
+    if (!passage->fault) {
+        return PassOn(passage);
+    }
+    const std::optional<std::uint32_t> argument = passage->fault->argument;
+    switch (passage->fault->kind) {
+        case FaultKind::Stall:
+            End(*passage, TransferStatus::Stalled, 0);
+            return Errors::Success;
+        case FaultKind::IoError:
+            End(*passage, TransferStatus::IoError, 0);
+            return Errors::Success;
+        case FaultKind::Overflow:
+            End(*passage, TransferStatus::Overflow, 0);
+            return Errors::Success;
+        case FaultKind::Empty:
+            End(*passage, TransferStatus::Completed, 0);
+            return Errors::Success;
+        case FaultKind::Silent:
+            return Errors::Success;
+        case FaultKind::Late:
+            HoldFor(passage, argument.value_or(0));
+            return Errors::Success;
+        case FaultKind::Short:
+            Shorten(*passage, argument.value_or(passage->length / 2));
+            return PassOn(passage);
+        case FaultKind::Long:
+            if (!passage->IsIn()) {
+                End(*passage, TransferStatus::Overflow, 0);
+                return Errors::Success;
+            }
+            return PassOn(passage);
+        case FaultKind::Stale:
+            if (passage->IsIn()) {
+                AnswerWithLastData(passage);
+                return Errors::Success;
+            }
+            ReplaceOutData(*passage);
+            return PassOn(passage);
+        case FaultKind::Garbage:
+        case FaultKind::Flip:
+            if (!passage->IsIn()) {
+                ReplaceOutData(*passage);
+            }
+            return PassOn(passage);
+        case FaultKind::GoneBefore:
+            TakeOut(*passage);
+            UnplugDevice();
+            return Errors::DeviceNotConnected;
+        case FaultKind::GoneDuring:
+            if (passage->endpoint != 0 && !passage->IsIn() && passage->length > 1) {
+                Shorten(*passage, passage->length / 2);
+                return PassOn(passage);
+            }
+            UnplugDevice();
+            return Errors::Success;
+        case FaultKind::LateCancel:
+        case FaultKind::GoneAfter:
+            break;
+    }
+    return PassOn(passage);
+}
+
+ErrorCode FaultInjector::PassOn(const PassagePointer& passage) {
+    constexpr std::uint8_t standardRequestToEndpoint = 0x02;
+    constexpr std::uint8_t clearFeature = 1;
+    {
+        const std::lock_guard lock(mutex);
+        passage->state = Passage::State::Submitting;
+        if (keepsData && !passage->IsIn()) {
+            lastData[{passage->endpoint, false}].assign(passage->data, passage->data + passage->length);
+        }
+        if (passage->endpoint == 0 && passage->setup.requestType == standardRequestToEndpoint &&
+            passage->setup.request == clearFeature) {
+            halted.erase(static_cast<std::uint8_t>(passage->setup.index));
+        }
+    }
+    const ErrorCode code = device->Submit(*passage);
+    if (code != Errors::Success) {
+        TakeOut(*passage);
+        return code;
+    }
+    {
+        const std::lock_guard lock(mutex);
+        if (passage->state != Passage::State::Submitting) {
+            return Errors::Success;
+        }
+        passage->state = Passage::State::InDevice;
+        if (!passage->cancelWanted) {
+            return Errors::Success;
+        }
+    }
+    device->Cancel(*passage);
+    return Errors::Success;
+}
+
+void FaultInjector::ReplaceOutData(Passage& passage) {
+    Bytes& data = passage.replacedData;
+    data.assign(passage.data, passage.data + passage.length);
+    if (passage.Has(FaultKind::Garbage)) {
+        FillWithGarbage(data.data(), data.size(), script->Hits());
+    } else if (passage.Has(FaultKind::Flip)) {
+        FlipBit(data.data(), data.size(), passage.fault->argument.value_or(0));
+    } else {
+        const std::lock_guard lock(mutex);
+        data = lastData[{passage.endpoint, false}];
+        data.resize(passage.length);
+    }
+    passage.data = data.data();
+}
+
+void FaultInjector::AnswerWithLastData(const PassagePointer& passage) {
+    std::uint32_t length = passage->length;
+    {
+        const std::lock_guard lock(mutex);
+        std::fill_n(passage->data, length, std::uint8_t{0});
+        if (const auto last = lastData.find({passage->endpoint, true}); last != lastData.end()) {
+            length = static_cast<std::uint32_t>(std::min<std::size_t>(length, last->second.size()));
+            std::copy_n(last->second.begin(), length, passage->data);
+        }
+    }
+    End(*passage, TransferStatus::Completed, length);
+}
+
+void FaultInjector::HoldFor(const PassagePointer& passage, std::uint32_t milliseconds) {
+    const EventId alarm = scheduler.CallAt(scheduler.Now() + std::uint64_t{milliseconds} * 1000,
+                                           [this, passage] { TimeHasCome(passage); });
+    const std::lock_guard lock(mutex);
+    if (const auto found = passages.find(passage->original);
+        found != passages.end() && found->second == passage && passage->state == Passage::State::Held) {
+        alarms[passage.get()] = alarm;
+    }
+}
+
+void FaultInjector::TimeHasCome(const PassagePointer& passage) {
+    bool waiting = false;
+    {
+        const std::lock_guard lock(mutex);
+        const auto found = passages.find(passage->original);
+        waiting = found != passages.end() && found->second == passage;
+        passage->state = Passage::State::Submitting;
+    }
+    if (waiting && PassOn(passage) != Errors::Success) {
+        passage->original->status = TransferStatus::DeviceGone;
+        passage->original->actualLength = 0;
+        passage->original->client->TransferCompleted(*passage->original);
+    }
+    // Known as waiting until now, so that the destructor waits for the end of this call.
+    const std::lock_guard lock(mutex);
+    alarms.erase(passage.get());
+}
+
+void FaultInjector::Cancel(Transfer& transfer) {
+    PassagePointer passage;
+    bool held = false;
+    {
+        const std::lock_guard lock(mutex);
+        const auto found = passages.find(&transfer);
+        if (found == passages.end()) {
+            return;
+        }
+        passage = found->second;
+        passage->cancelWanted = true;
+        if (passage->state == Passage::State::Submitting) {
+            return;
+        }
+        held = passage->state != Passage::State::InDevice;
+    }
+    if (held) {
+        End(*passage, TransferStatus::Cancelled,
+            passage->state == Passage::State::HeldWithData ? passage->actualLength : 0);
+    } else {
+        device->Cancel(*passage);
+    }
+}
+
+ErrorCode FaultInjector::ClearHalt(std::uint8_t endpoint) {
+    {
+        const std::lock_guard lock(mutex);
+        if (gone) {
+            return Errors::DeviceNotConnected;
+        }
+        halted.erase(endpoint);
+    }
+    return device->ClearHalt(endpoint);
+}
+
+void FaultInjector::TransferCompleted(Transfer& transfer) noexcept {
+    ++completing;
+    auto& passage = static_cast<Passage&>(transfer);
+    const bool unplugs = passage.Has(FaultKind::GoneDuring) || passage.Has(FaultKind::GoneAfter);
+    bool held = false;
+    {
+        const std::lock_guard lock(mutex);
+        held = passage.Has(FaultKind::LateCancel) && !passage.cancelWanted && !gone &&
+               passage.status == TransferStatus::Completed;
+        passage.state = held ? Passage::State::HeldWithData : Passage::State::InDevice;
+        if (!held) {
+            ChangeOutcome(passage);
+        }
+    }
+    if (!held) {
+        End(passage, passage.status, passage.actualLength);
+    }
+    if (unplugs) {
+        UnplugDevice();
+    }
+    --completing;
+}
+
+void FaultInjector::ChangeOutcome(Passage& passage) {
+    if (gone || passage.Has(FaultKind::GoneDuring)) {
+        passage.status = TransferStatus::DeviceGone;
+    } else if (passage.Has(FaultKind::LateCancel) && passage.status == TransferStatus::Completed) {
+        passage.status = TransferStatus::Cancelled;
+    } else if (passage.Has(FaultKind::Long) && passage.status == TransferStatus::Completed) {
+        passage.status = TransferStatus::Overflow;
+    }
+    if (!passage.IsIn()) {
+        return;
+    }
+    if (passage.Has(FaultKind::Garbage)) {
+        FillWithGarbage(passage.data, passage.actualLength, script->Hits());
+    } else if (passage.Has(FaultKind::Flip)) {
+        FlipBit(passage.data, passage.actualLength, passage.fault->argument.value_or(0));
+    }
+    if (keepsData) {
+        try {
+            lastData[{passage.endpoint, true}].assign(passage.data, passage.data + passage.actualLength);
+        } catch (const std::bad_alloc&) {  // older data are as stale
+        }
+    }
+}
+
+void FaultInjector::UnplugDevice() {
+    std::vector<PassagePointer> held;
+    std::vector<PassagePointer> inDevice;
+    {
+        const std::lock_guard lock(mutex);
+        if (std::exchange(gone, true)) {
+            return;
+        }
+        for (const auto& [original, passage] : passages) {
+            passage->cancelWanted = true;
+            if (passage->state == Passage::State::InDevice) {
+                inDevice.push_back(passage);
+            } else if (passage->state != Passage::State::Submitting) {
+                held.push_back(passage);
+            }
+        }
+    }
+    if (unplug) {
+        unplug();
+    }
+    for (const PassagePointer& passage : held) {
+        End(*passage, TransferStatus::DeviceGone, 0);
+    }
+    for (const PassagePointer& passage : inDevice) {
+        device->Cancel(*passage);
+    }
+}
+
+PassagePointer FaultInjector::TakeOut(const Passage& passage) {
+    const std::lock_guard lock(mutex);
+    const auto found = passages.find(passage.original);
+    if (found == passages.end() || found->second.get() != &passage) {
+        return nullptr;
+    }
+    PassagePointer taken = std::move(found->second);
+    passages.erase(found);
+    return taken;
+}
+
+void FaultInjector::End(const Passage& passage, TransferStatus status, std::uint32_t actualLength) {
+    // Keeps the copy alive for the device that is completing it.
+    const PassagePointer taken = TakeOut(passage);
+    if (!taken) {
+        return;
+    }
+    Transfer& original = *taken->original;
+    original.status = status;
+    original.actualLength = actualLength;
+    original.client->TransferCompleted(original);
+}
+
+}  // namespace
+
+std::shared_ptr<UsbDevice> InjectFaults(std::shared_ptr<UsbDevice> device,
+                                        std::shared_ptr<FaultScript> script,
+                                        Platform::EventScheduler& scheduler, std::function<void()> unplug) {
+    return std::make_shared<FaultInjector>(std::move(device), std::move(script), scheduler,
+                                           std::move(unplug));
+}
+
+}  // namespace Varnholt::Simulator

@@ -1,0 +1,210 @@
+#include "FaultPlan.h"
+
+#include <algorithm>
+#include <charconv>
+#include <stdexcept>
+
+#include "Protocol/Instrument.h"
+
+namespace Varnholt::Simulator {
+namespace {
+
+using Argument = FaultName::Argument;
+
+constexpr std::array Names{
+    FaultName{FaultKind::Stall, "stall", Argument::None, ""},
+    FaultName{FaultKind::IoError, "io-error", Argument::None, ""},
+    FaultName{FaultKind::Overflow, "overflow", Argument::None, ""},
+    FaultName{FaultKind::Silent, "silent", Argument::None, ""},
+    FaultName{FaultKind::Short, "short", Argument::Optional, "BYTES"},
+    FaultName{FaultKind::Empty, "empty", Argument::None, ""},
+    FaultName{FaultKind::Long, "long", Argument::None, ""},
+    FaultName{FaultKind::Stale, "stale", Argument::None, ""},
+    FaultName{FaultKind::Garbage, "garbage", Argument::None, ""},
+    FaultName{FaultKind::Flip, "flip", Argument::Optional, "BIT"},
+    FaultName{FaultKind::Late, "late", Argument::Required, "MILLISECONDS"},
+    FaultName{FaultKind::LateCancel, "late-cancel", Argument::None, ""},
+    FaultName{FaultKind::GoneBefore, "gone-before", Argument::None, ""},
+    FaultName{FaultKind::GoneDuring, "gone-during", Argument::None, ""},
+    FaultName{FaultKind::GoneAfter, "gone-after", Argument::None, ""},
+};
+
+struct ScopeName {
+    FaultScope scope;
+    std::string_view name;
+};
+constexpr std::array Scopes{
+    ScopeName{FaultScope::Control, "control"},
+    ScopeName{FaultScope::BulkIn, "bulk-in"},
+    ScopeName{FaultScope::BulkOut, "bulk-out"},
+    ScopeName{FaultScope::Interrupt, "interrupt"},
+};
+
+[[noreturn]] void Refuse(std::string_view fault, const std::string& reason) {
+    throw std::invalid_argument("fault plan: \"" + std::string(fault) + "\": " + reason);
+}
+
+std::string_view Trimmed(std::string_view text) {
+    constexpr std::string_view blanks = " \t\r\n";
+    const auto first = text.find_first_not_of(blanks);
+    return first == text.npos ? std::string_view()
+                              : text.substr(first, text.find_last_not_of(blanks) - first + 1);
+}
+
+std::optional<std::uint32_t> Number(std::string_view text) {
+    std::uint32_t number = 0;
+    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
+    return error == std::errc() && end == text.data() + text.size() ? std::optional(number) : std::nullopt;
+}
+
+template <class Names>
+std::string Joined(const Names& names) {
+    std::string text;
+    for (const auto& entry : names) {
+        text += (text.empty() ? "" : ", ") + std::string(entry.name);
+    }
+    return text;
+}
+
+/// "bulk-in 7+" in front of the colon.
+void ParsePlace(std::string_view text, std::string_view place, Fault& fault) {
+    if (const auto blank = place.find_last_of(" \t"); blank != place.npos) {
+        const std::string_view scopeName = Trimmed(place.substr(0, blank));
+        const auto scope = std::ranges::find(Scopes, scopeName, &ScopeName::name);
+        if (scope == Scopes.end()) {
+            Refuse(text, "unknown transfers \"" + std::string(scopeName) + "\"; known: " + Joined(Scopes));
+        }
+        fault.scope = scope->scope;
+        place = place.substr(blank + 1);
+    }
+    if (place.ends_with('+')) {
+        fault.fromThenOn = true;
+        place.remove_suffix(1);
+    }
+    const auto index = Number(place);
+    if (!index) {
+        Refuse(text, "\"" + std::string(place) + "\" is no transfer index");
+    }
+    fault.index = *index;
+}
+
+/// "short=10" behind the colon.
+void ParseKind(std::string_view text, std::string_view kind, Fault& fault) {
+    const auto equals = kind.find('=');
+    const std::string_view name = Trimmed(kind.substr(0, equals));
+    const auto known = std::ranges::find(Names, name, &FaultName::name);
+    if (known == Names.end()) {
+        Refuse(text, "unknown fault \"" + std::string(name) + "\"; known: " + Joined(Names));
+    }
+    fault.kind = known->kind;
+    if (equals == kind.npos) {
+        if (known->argument == Argument::Required) {
+            Refuse(text, "needs a number: " + std::string(name) + "=" + std::string(known->argumentName));
+        }
+        return;
+    }
+    if (known->argument == Argument::None) {
+        Refuse(text, std::string(name) + " takes no number");
+    }
+    const std::string_view number = Trimmed(kind.substr(equals + 1));
+    fault.argument = Number(number);
+    if (!fault.argument) {
+        Refuse(text, "\"" + std::string(number) + "\" is no number");
+    }
+}
+
+Fault ParseFault(std::string_view text) {
+    const auto colon = text.find(':');
+    if (colon == text.npos) {
+        Refuse(text, "expected INDEX:FAULT, as in 3:stall");
+    }
+    Fault fault;
+    ParsePlace(text, Trimmed(text.substr(0, colon)), fault);
+    ParseKind(text, Trimmed(text.substr(colon + 1)), fault);
+    return fault;
+}
+
+std::size_t Place(FaultScope scope) {
+    return static_cast<std::size_t>(scope);
+}
+
+}  // namespace
+
+std::span<const FaultName> AllFaults() {
+    return Names;
+}
+
+FaultScope ScopeOfEndpoint(std::uint8_t endpoint) {
+    switch (endpoint) {
+        case 0:
+            return FaultScope::Control;
+        case Protocol::InterruptInEndpoint:
+            return FaultScope::Interrupt;
+        default:
+            return (endpoint & 0x80) != 0 ? FaultScope::BulkIn : FaultScope::BulkOut;
+    }
+}
+
+FaultPlan FaultPlan::Parse(std::string_view text) {
+    std::vector<Fault> faults;
+    while (!text.empty()) {
+        const auto end = text.find(';');
+        if (const std::string_view fault = Trimmed(text.substr(0, end)); !fault.empty()) {
+            faults.push_back(ParseFault(fault));
+        }
+        text = end == text.npos ? std::string_view() : text.substr(end + 1);
+    }
+    return FaultPlan(std::move(faults));
+}
+
+std::string ToText(const Fault& fault) {
+    std::string text;
+    if (const auto scope = std::ranges::find(Scopes, fault.scope, &ScopeName::scope); scope != Scopes.end()) {
+        text = std::string(scope->name) + " ";
+    }
+    text += std::to_string(fault.index) + (fault.fromThenOn ? "+:" : ":");
+    text += std::ranges::find(Names, fault.kind, &FaultName::kind)->name;
+    return fault.argument ? text + "=" + std::to_string(*fault.argument) : text;
+}
+
+std::string FaultPlan::Text() const {
+    std::string text;
+    for (const Fault& fault : faults) {
+        text += (text.empty() ? "" : "; ") + ToText(fault);
+    }
+    return text;
+}
+
+bool FaultPlan::Uses(FaultKind kind) const {
+    return std::ranges::find(faults, kind, &Fault::kind) != faults.end();
+}
+
+std::optional<Fault> FaultScript::Next(std::uint8_t endpoint) {
+    const std::lock_guard lock(mutex);
+    const FaultScope own = ScopeOfEndpoint(endpoint);
+    const std::uint32_t inAll = counts[Place(FaultScope::All)]++;
+    const std::uint32_t inOwn = counts[Place(own)]++;
+    for (const Fault& fault : plan.Faults()) {
+        if (fault.scope != FaultScope::All && fault.scope != own) {
+            continue;
+        }
+        const std::uint32_t index = fault.scope == FaultScope::All ? inAll : inOwn;
+        if (index == fault.index || (fault.fromThenOn && index > fault.index)) {
+            ++hits;
+            return fault;
+        }
+    }
+    return std::nullopt;
+}
+
+std::uint32_t FaultScript::Transfers() const {
+    const std::lock_guard lock(mutex);
+    return counts[Place(FaultScope::All)];
+}
+
+std::uint32_t FaultScript::Hits() const {
+    const std::lock_guard lock(mutex);
+    return hits;
+}
+
+}  // namespace Varnholt::Simulator

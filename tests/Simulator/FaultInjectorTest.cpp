@@ -1,0 +1,339 @@
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <string>
+
+#include "FaultInjector.h"
+#include "Protocol/ByteOrder.h"
+#include "SimulatedBus.h"
+#include "Simulator/ManualScheduler.h"
+#include "Simulator/TestTransfer.h"
+
+namespace Varnholt::Simulator {
+namespace {
+
+using Platform::Usb::TransferStatus;
+using Platform::Usb::UsbDevice;
+using Protocol::BulkInEndpoint;
+using Protocol::BulkOutEndpoint;
+using Protocol::InterruptInEndpoint;
+using Protocol::Request;
+using Bytes = std::vector<std::uint8_t>;
+namespace Errors = Platform::Errors;
+
+constexpr std::uint32_t ReadLength = 64;
+
+Bytes AddressAndLength(std::uint32_t address, std::uint16_t length) {
+    Bytes bytes(8);
+    Protocol::StoreBig32(&bytes[0], address);
+    Protocol::StoreBig16(&bytes[4], length);
+    return bytes;
+}
+
+/// A bus with one instrument whose memory is 0, 1, 2, ...
+class FaultInjectorTest : public testing::Test {
+  protected:
+    FaultInjectorTest() {
+        Bytes content(Protocol::EepromSize);
+        for (std::size_t i = 0; i < content.size(); ++i) {
+            content[i] = static_cast<std::uint8_t>(i);
+        }
+        InstrumentSettings settings;
+        settings.eeprom = content;
+        bus.Add("one", settings);
+    }
+    ~FaultInjectorTest() override { EXPECT_EQ(0U, bus.Instrument("one").PendingTransfers()); }
+
+    std::shared_ptr<UsbDevice> Open(const std::string& plan) {
+        bus.SetFaults("one", FaultPlan::Parse(plan));
+        Platform::ErrorCode error = Errors::Success;
+        return bus.Open("one", error);
+    }
+    /// Has the instrument send its memory from `address` on.
+    static void AskForMemory(UsbDevice& device, std::uint32_t address) {
+        TestTransfer request =
+            TestTransfer::Vendor(Request::ReadEeprom, AddressAndLength(address, ReadLength));
+        EXPECT_EQ(Errors::Success, device.Submit(request));
+        EXPECT_EQ(TransferStatus::Completed, request.status);
+    }
+    static Bytes Memory(std::uint8_t first, std::size_t length) {
+        Bytes bytes(length);
+        std::iota(bytes.begin(), bytes.end(), first);
+        return bytes;
+    }
+
+    ManualScheduler scheduler;
+    SimulatedBus bus{scheduler};
+};
+
+TEST_F(FaultInjectorTest, FaultsOfABulkReadAndWhatComesNext) {
+    Bytes flipped = Memory(10, ReadLength);
+    flipped[2] ^= 0x08;
+    struct Case {
+        const char* fault;
+        TransferStatus status;
+        Bytes data;
+        /// What the next read of the same endpoint gets; nothing: it stays pending.
+        Bytes next;
+    };
+    for (const Case& test : {
+             Case{"stall", TransferStatus::Stalled, {}, Memory(10, ReadLength)},
+             Case{"io-error", TransferStatus::IoError, {}, Memory(10, ReadLength)},
+             Case{"overflow", TransferStatus::Overflow, {}, Memory(10, ReadLength)},
+             Case{"empty", TransferStatus::Completed, {}, Memory(10, ReadLength)},
+             Case{"short", TransferStatus::Completed, Memory(10, 32), Memory(42, 32)},
+             Case{"short=60", TransferStatus::Completed, Memory(10, 60), Memory(70, 4)},
+             Case{"short=1000", TransferStatus::Completed, Memory(10, ReadLength), {}},
+             Case{"long", TransferStatus::Overflow, Memory(10, ReadLength), {}},
+             Case{"stale", TransferStatus::Completed, Memory(200, ReadLength), Memory(10, ReadLength)},
+             Case{"flip=19", TransferStatus::Completed, flipped, {}},
+         }) {
+        const auto device = Open("bulk-in 1:" + std::string(test.fault));
+        AskForMemory(*device, 200);
+        TestTransfer before = TestTransfer::In(BulkInEndpoint, ReadLength);
+        device->Submit(before);
+        EXPECT_EQ(Memory(200, ReadLength), before.Data()) << test.fault;
+
+        AskForMemory(*device, 10);
+        TestTransfer hit = TestTransfer::In(BulkInEndpoint, ReadLength);
+        EXPECT_EQ(Errors::Success, device->Submit(hit)) << test.fault;
+        EXPECT_EQ(1, hit.completions) << test.fault;
+        EXPECT_EQ(test.status, hit.status) << test.fault;
+        EXPECT_EQ(test.data, hit.Data()) << test.fault;
+
+        if (test.status == TransferStatus::Stalled) {
+            TestTransfer halted = TestTransfer::In(BulkInEndpoint, ReadLength);
+            device->Submit(halted);
+            EXPECT_EQ(TransferStatus::Stalled, halted.status) << "halted until cleared";
+            device->ClearHalt(BulkInEndpoint);
+        }
+        TestTransfer next = TestTransfer::In(BulkInEndpoint, ReadLength);
+        device->Submit(next);
+        EXPECT_EQ(test.next.empty() ? 0 : 1, next.completions) << test.fault;
+        if (next.completions == 0) {
+            device->Cancel(next);
+        } else {
+            EXPECT_EQ(test.next, next.Data()) << test.fault;
+        }
+    }
+}
+
+TEST_F(FaultInjectorTest, FaultsOfABulkWrite) {
+    const Bytes sent{0x11, 0x22, 0x33, 0x44};
+    const Bytes old = Memory(0, 4);
+    struct Case {
+        const char* fault;
+        TransferStatus status;
+        std::uint32_t moved;
+        Bytes memory;
+    };
+    for (const Case& test : {
+             Case{"stall", TransferStatus::Stalled, 0, old},
+             Case{"io-error", TransferStatus::IoError, 0, old},
+             Case{"overflow", TransferStatus::Overflow, 0, old},
+             Case{"long", TransferStatus::Overflow, 0, old},
+             Case{"empty", TransferStatus::Completed, 0, old},
+             Case{"short=3", TransferStatus::Completed, 3, {0x11, 0x22, 0x33, 3}},
+             Case{"stale", TransferStatus::Completed, 4, {0x99, 0, 0, 0}},
+             Case{"flip=8", TransferStatus::Completed, 4, {0x11, 0x23, 0x33, 0x44}},
+             Case{"gone-before", TransferStatus::DeviceGone, 0, old},
+             Case{"gone-during", TransferStatus::DeviceGone, 2, {0x11, 0x22, 2, 3}},
+             Case{"gone-after", TransferStatus::Completed, 4, sent},
+         }) {
+        SimulatedInstrument& instrument = bus.Instrument("one");
+        Bytes content = instrument.Eeprom();
+        std::ranges::copy(old, content.begin());
+        instrument.SetEeprom(content);
+        const auto device = Open("bulk-out 1:" + std::string(test.fault));
+        TestTransfer before = TestTransfer::Vendor(Request::WriteEeprom, AddressAndLength(100, 1));
+        TestTransfer beforeData = TestTransfer::Out(BulkOutEndpoint, {0x99});
+        TestTransfer request = TestTransfer::Vendor(Request::WriteEeprom, AddressAndLength(0, 4));
+        TestTransfer data = TestTransfer::Out(BulkOutEndpoint, sent);
+        device->Submit(before);
+        device->Submit(beforeData);
+        device->Submit(request);
+        const bool refused = std::string(test.fault) == "gone-before";
+        EXPECT_EQ(refused ? Errors::DeviceNotConnected : Errors::Success, device->Submit(data)) << test.fault;
+        EXPECT_EQ(refused ? 0 : 1, data.completions) << test.fault;
+        if (!refused) {
+            EXPECT_EQ(test.status, data.status) << test.fault;
+            EXPECT_EQ(test.moved, data.actualLength) << test.fault;
+        }
+        content = instrument.Eeprom();
+        EXPECT_EQ(test.memory, Bytes(content.begin(), content.begin() + 4)) << test.fault;
+        EXPECT_EQ(sent, data.buffer) << "the sender's own data stay as they are";
+        instrument.PlugIn();
+    }
+}
+
+TEST_F(FaultInjectorTest, GarbageIsNoDataAndTheSameEachTime) {
+    Bytes seen;
+    for (int round = 0; round < 2; ++round) {
+        const auto device = Open("bulk-in 0:garbage");
+        AskForMemory(*device, 10);
+        TestTransfer hit = TestTransfer::In(BulkInEndpoint, ReadLength);
+        device->Submit(hit);
+        EXPECT_EQ(ReadLength, hit.actualLength);
+        EXPECT_NE(Memory(10, ReadLength), hit.Data());
+        EXPECT_TRUE(round == 0 || seen == hit.Data());
+        seen = hit.Data();
+    }
+}
+
+TEST_F(FaultInjectorTest, ShortRequestsReachTheInstrumentShort) {
+    const auto device = Open("0:short=4; 1:short=2");
+    TestTransfer parameters = TestTransfer::Vendor(Request::SetMeasureParameters, Bytes(8, 1));
+    device->Submit(parameters);
+    EXPECT_EQ(TransferStatus::Stalled, parameters.status) << "four bytes are not enough for it";
+    TestTransfer misc = TestTransfer::VendorQuestion(Request::GetMisc, 8);
+    device->Submit(misc);
+    EXPECT_EQ((Bytes{0x01, 0x2D}), misc.Data());
+}
+
+TEST_F(FaultInjectorTest, SilentTransferEndsWithItsCancellationOnly) {
+    const auto device = Open("1+:silent");
+    AskForMemory(*device, 10);
+    TestTransfer hit = TestTransfer::In(BulkInEndpoint, ReadLength);
+    TestTransfer request = TestTransfer::Vendor(Request::Reset, {31});
+    device->Submit(hit);
+    device->Submit(request);
+    scheduler.Advance(3'600'000'000);
+    for (TestTransfer* transfer : {&hit, &request}) {
+        EXPECT_EQ(0, transfer->completions);
+        device->Cancel(*transfer);
+        device->Cancel(*transfer);
+        EXPECT_EQ(1, transfer->completions);
+        EXPECT_EQ(TransferStatus::Cancelled, transfer->status);
+        EXPECT_EQ(0U, transfer->actualLength);
+    }
+}
+
+TEST_F(FaultInjectorTest, LateTransferReachesTheInstrumentLater) {
+    const auto device = Open("bulk-in 0+:late=20");
+    AskForMemory(*device, 10);
+    TestTransfer cancelled = TestTransfer::In(BulkInEndpoint, ReadLength);
+    device->Submit(cancelled);
+    scheduler.Advance(19'999);
+    device->Cancel(cancelled);
+    EXPECT_EQ(TransferStatus::Cancelled, cancelled.status);
+    TestTransfer hit = TestTransfer::In(BulkInEndpoint, ReadLength);
+    device->Submit(hit);
+    scheduler.Advance(19'999);
+    EXPECT_EQ(0, hit.completions);
+    scheduler.Advance(1);
+    EXPECT_EQ(Memory(10, ReadLength), hit.Data()) << "nothing was lost to the cancelled one";
+    EXPECT_EQ(1, cancelled.completions);
+}
+
+TEST_F(FaultInjectorTest, LateTransferDoesNotOutliveTheDevice) {
+    TestTransfer hit = TestTransfer::In(BulkInEndpoint, ReadLength);
+    {
+        const auto device = Open("0:late=20");
+        device->Submit(hit);
+    }
+    EXPECT_EQ(1, hit.completions);
+    EXPECT_EQ(TransferStatus::Cancelled, hit.status);
+    EXPECT_EQ(0U, scheduler.Waiting());
+}
+
+TEST_F(FaultInjectorTest, LateCancelBringsDataWithTheCancellation) {
+    const auto device = Open("bulk-in 0+:late-cancel");
+    AskForMemory(*device, 10);
+    TestTransfer hit = TestTransfer::In(BulkInEndpoint, 40);
+    device->Submit(hit);
+    EXPECT_EQ(0, hit.completions);
+    device->Cancel(hit);
+    EXPECT_EQ(1, hit.completions);
+    EXPECT_EQ(TransferStatus::Cancelled, hit.status);
+    EXPECT_EQ(Memory(10, 40), hit.Data());
+
+    TestTransfer rest = TestTransfer::In(BulkInEndpoint, ReadLength);
+    device->Submit(rest);
+    device->Cancel(rest);
+    EXPECT_EQ(Memory(50, 24), rest.Data()) << "each byte comes once";
+}
+
+TEST_F(FaultInjectorTest, GoneDeviceEndsEverythingAndStaysGone) {
+    for (const std::string kind : {"gone-before", "gone-during", "gone-after"}) {
+        const auto device = Open("2:" + kind);
+        ASSERT_EQ(Errors::Success, device->Claim());
+        TestTransfer interrupt = TestTransfer::In(InterruptInEndpoint, 1);
+        device->Submit(interrupt);
+        AskForMemory(*device, 10);
+        TestTransfer hit = TestTransfer::In(BulkInEndpoint, ReadLength);
+        const auto code = device->Submit(hit);
+        EXPECT_EQ(kind == "gone-before" ? Errors::DeviceNotConnected : Errors::Success, code) << kind;
+        EXPECT_EQ(kind == "gone-before" ? 0 : 1, hit.completions) << kind;
+        if (kind != "gone-before") {
+            EXPECT_EQ(kind == "gone-after" ? TransferStatus::Completed : TransferStatus::DeviceGone,
+                      hit.status);
+        }
+        EXPECT_EQ(1, interrupt.completions) << kind;
+        EXPECT_EQ(TransferStatus::DeviceGone, interrupt.status) << kind;
+
+        TestTransfer after = TestTransfer::In(BulkInEndpoint, ReadLength);
+        EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(after)) << kind;
+        EXPECT_EQ(Errors::DeviceNotConnected, device->Claim()) << kind;
+        EXPECT_TRUE(bus.List().empty()) << kind;
+
+        bus.PlugIn("one");
+        EXPECT_EQ(Errors::DeviceNotConnected, device->Claim()) << kind;
+        Platform::ErrorCode error = Errors::Success;
+        const auto again = bus.Open("one", error);
+        EXPECT_EQ(Errors::Success, again->Claim()) << kind;
+        AskForMemory(*again, 10);
+    }
+}
+
+TEST(SimulatedBusTest, ListsWhatIsPluggedInByName) {
+    ManualScheduler scheduler;
+    SimulatedBus bus(scheduler);
+    bus.Add("b");
+    bus.Add("a");
+    EXPECT_EQ((std::vector<std::string>{"a", "b"}), bus.List());
+    bus.Unplug("a");
+    EXPECT_EQ((std::vector<std::string>{"b"}), bus.List());
+    Platform::ErrorCode error = Errors::Success;
+    EXPECT_EQ(nullptr, bus.Open("a", error));
+    EXPECT_EQ(Errors::FileNotFound, error);
+    EXPECT_EQ(nullptr, bus.Open("c", error));
+    EXPECT_NE(nullptr, bus.Open("b", error));
+    EXPECT_EQ(Errors::Success, error);
+}
+
+TEST(TransferRecorderTest, WritesDownWhatTheHostSees) {
+    ManualScheduler scheduler;
+    SimulatedBus bus(scheduler);
+    bus.Add("one");
+    TransferRecorder recorder;
+    bus.WrapDevices([&](const std::string&, std::shared_ptr<UsbDevice> device) {
+        return recorder.Record(std::move(device));
+    });
+    bus.SetFaults("one", FaultPlan::Parse("2:stall; 4:gone-before"));
+    Platform::ErrorCode error = Errors::Success;
+    const auto device = bus.Open("one", error);
+    TestTransfer reset = TestTransfer::Vendor(Request::Reset, {31});
+    TestTransfer chip = TestTransfer::VendorQuestion(Request::GetChipId, 8);
+    TestTransfer bulk = TestTransfer::In(BulkInEndpoint, 256);
+    TestTransfer interrupt = TestTransfer::In(InterruptInEndpoint, 1);
+    TestTransfer last = TestTransfer::Out(BulkOutEndpoint, {1, 2});
+    for (TestTransfer* transfer : {&reset, &chip, &bulk, &interrupt}) {
+        device->Submit(*transfer);
+    }
+    EXPECT_EQ("interrupt 1: pending", recorder.Transfers().back().Text());
+    device->Submit(last);
+    std::string text;
+    for (const RecordedTransfer& transfer : recorder.Transfers()) {
+        text += transfer.Text(4) + "\n";
+    }
+    EXPECT_EQ(
+        "control CA out 1: 1F\n"
+        "control D2 in 8: 5A 01 23 45 ...\n"
+        "bulk-in 256: stalled\n"
+        "interrupt 1: device gone\n"
+        "bulk-out 2: 01 02 not accepted\n",
+        text);
+}
+
+}  // namespace
+}  // namespace Varnholt::Simulator
