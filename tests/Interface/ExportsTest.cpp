@@ -1,0 +1,182 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <array>
+#include <numeric>
+#include <vector>
+
+#include "ostra.h"
+#include "Platform/VirtualClock.h"
+#include "Protocol/Instrument.h"
+#include "Support/SimulatedHost.h"
+#include "TransferRecorder.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using testing::Each;
+using testing::StrEq;
+
+std::string LastError() {
+    return b5ae189db26b2a1b("LastError");
+}
+
+std::vector<std::uint8_t> CountingImage() {
+    std::vector<std::uint8_t> image(OSTRA_IMAGE_SIZE);
+    for (std::size_t i = 0; i < image.size(); ++i) {
+        image[i] = static_cast<std::uint8_t>(i * 7 + i / 256);
+    }
+    return image;
+}
+
+class Exports : public testing::TestWithParam<Transport> {
+  protected:
+    Platform::VirtualClock clock{1};
+    SimulatedHost host{GetParam()};
+    Simulator::TransferRecorder recorder;
+    std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
+
+    void Record() {
+        host.Bus().WrapDevices([this](const std::string&, auto device) { return recorder.Record(device); });
+    }
+    /// The recorded transfers as text, those of the interrupt endpoint left out: when they happen is the
+    /// listener thread's business.
+    std::vector<std::string> Transcript() const {
+        std::vector<std::string> lines;
+        for (const auto& transfer : recorder.Transfers()) {
+            if (transfer.endpoint != Protocol::InterruptInEndpoint) {
+                lines.push_back(transfer.Text(8));
+            }
+        }
+        return lines;
+    }
+};
+INSTANTIATE_TEST_SUITE_P(Transports, Exports, testing::Values(Transport::Native, Transport::UsbIo),
+                         [](const auto& info) { return std::string(Name(info.param)); });
+
+TEST_P(Exports, ReadoutReturnsTheSensorsValues) {
+    auto& instrument = host.Add("one");
+    const std::uint64_t before = clock.ElapsedMilliseconds();
+    ASSERT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_OK) << LastError();
+    EXPECT_GE(clock.ElapsedMilliseconds() - before, 1000U);
+    EXPECT_LT(clock.ElapsedMilliseconds() - before, 1100U);
+    EXPECT_EQ(LastError(), "");
+    EXPECT_EQ(values[0], values[1]);
+    EXPECT_EQ(values[127], values[126]);
+    EXPECT_NE(*std::ranges::max_element(values), *std::ranges::min_element(values));
+    EXPECT_FALSE(instrument.Claimed());
+    EXPECT_EQ(instrument.PendingTransfers(), 0U);
+}
+
+TEST_P(Exports, ImageArrivesWhole) {
+    auto& instrument = host.Add("one");
+    const auto image = CountingImage();
+    ASSERT_EQ(f3355d91d5df0e0b(image.data(), host.Identifier("one").c_str()), OSTRA_OK) << LastError();
+    EXPECT_EQ(instrument.Eeprom(), image);
+    EXPECT_FALSE(instrument.Claimed());
+}
+
+TEST_P(Exports, WithoutAnInstrumentTheTextIsEmpty) {
+    const auto image = CountingImage();
+    EXPECT_EQ(f3355d91d5df0e0b(image.data(), ""), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_EQ(LastError(), "");
+    EXPECT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_FAILURE);
+    EXPECT_EQ(LastError(), "");
+    EXPECT_THAT(values, Each(0));
+}
+
+TEST_P(Exports, TheNamedInstrumentIsTaken) {
+    auto& first = host.Add("a");
+    auto& second = host.Add("b");
+    Record();
+    const auto image = CountingImage();
+    const auto untouched = first.Eeprom();
+    ASSERT_EQ(f3355d91d5df0e0b(image.data(), host.Identifier("b").c_str()), OSTRA_OK) << LastError();
+    EXPECT_EQ(second.Eeprom(), image);
+    EXPECT_EQ(first.Eeprom(), untouched);
+    // The one before it was opened and reset as well.
+    EXPECT_EQ(std::ranges::count(Transcript(), "control CA out 1: 1F"), 2);
+
+    EXPECT_EQ(f3355d91d5df0e0b(image.data(), host.Identifier("B").c_str()), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_EQ(LastError(), "");
+    first.Unplug();
+    EXPECT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_OK);
+}
+
+TEST_P(Exports, AnInstrumentThatDoesNotOpenIsPassedOver) {
+    host.Add("a");
+    auto& second = host.Add("b");
+    host.Bus().WrapDevices([this](const std::string& name, auto device) {
+        auto recorded = recorder.Record(device);
+        if (name == "a") {
+            EXPECT_EQ(device->Claim(), 0U);  // somebody else has it
+        }
+        return recorded;
+    });
+    const auto image = CountingImage();
+    ASSERT_EQ(f3355d91d5df0e0b(image.data(), ""), OSTRA_OK) << LastError();
+    EXPECT_EQ(second.Eeprom(), image);
+}
+
+TEST_P(Exports, ReadoutSendsItsFixedSequence) {
+    host.Add("one");
+    Record();
+    ASSERT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_OK);
+    std::vector<std::string> expected{"control CA out 1: 1F", "control C1 out 8: 01 26 00 00 00 01 06 00",
+                                      "control C0 out 0:", "bulk-in 256:"};
+    auto lines = Transcript();
+    if (GetParam() == Transport::Native) {
+        expected.push_back("control D0 out");  // the untouched button is reported at the end
+    }
+    ASSERT_EQ(lines.size(), expected.size()) << testing::PrintToString(lines);
+    for (std::size_t i = 0; i < lines.size(); ++i) {
+        EXPECT_THAT(lines[i], testing::StartsWith(expected[i]));
+    }
+}
+
+TEST_P(Exports, ImageWriteSends32Pieces) {
+    host.Add("one");
+    Record();
+    ASSERT_EQ(f3355d91d5df0e0b(CountingImage().data(), ""), OSTRA_OK);
+    const auto lines = Transcript();
+    ASSERT_GE(lines.size(), 1U + 32 * 4);
+    for (std::size_t piece = 0; piece < 32; ++piece) {
+        char request[64];
+        std::snprintf(request, sizeof request, "control C3 out 8: 00 00 %02zX 00 01 00 00 00", piece);
+        const std::size_t line = 1 + 4 * piece;
+        EXPECT_EQ(lines[line], request);
+        EXPECT_THAT(lines[line + 1], testing::StartsWith("bulk-out 256: "));
+        EXPECT_EQ(lines[line + 2], "bulk-out 1: 00");
+        EXPECT_EQ(lines[line + 3], "bulk-out 1: 00");
+    }
+}
+
+TEST_P(Exports, NullPointersAreRefused) {
+    host.Add("one");
+    EXPECT_EQ(f3355d91d5df0e0b(nullptr, ""), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_EQ(LastError(), "unknown error");
+    EXPECT_EQ(f3355d91d5df0e0b(CountingImage().data(), nullptr), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_EQ(d4fb86cecc88582a(nullptr, ""), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_EQ(d4fb86cecc88582a(values.data(), nullptr), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_EQ(LastError(), "unknown error");
+    EXPECT_THAT(b5ae189db26b2a1b(nullptr), StrEq(""));
+}
+
+TEST_P(Exports, TextsFollowTheirRules) {
+    EXPECT_EQ(d4fb86cecc88582a(nullptr, ""), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_EQ(LastError(), "unknown error");
+    EXPECT_EQ(LastError(), "unknown error");
+    EXPECT_THAT(b5ae189db26b2a1b("SDKVersion"), StrEq("1.0.3"));
+    EXPECT_EQ(LastError(), "");
+
+    EXPECT_EQ(d4fb86cecc88582a(nullptr, ""), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_THAT(b5ae189db26b2a1b("sdkversion"), StrEq(""));
+    EXPECT_EQ(LastError(), "");
+
+    EXPECT_EQ(d4fb86cecc88582a(nullptr, ""), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_THAT(c288a3930ffaa9d7(), StrEq(""));
+    EXPECT_EQ(LastError(), "");
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests
