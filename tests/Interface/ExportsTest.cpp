@@ -52,7 +52,7 @@ class Exports : public testing::TestWithParam<Transport> {
     }
 };
 INSTANTIATE_TEST_SUITE_P(Transports, Exports, testing::Values(Transport::Native, Transport::UsbIo),
-                         [](const auto& info) { return std::string(Name(info.param)); });
+                         [](const auto& parameter) { return std::string(Name(parameter.param)); });
 
 TEST_P(Exports, ReadoutReturnsTheSensorsValues) {
     auto& instrument = host.Add("one");
