@@ -1,5 +1,6 @@
 #include "UsbIo/CUsbIoBuffer.h"
 
+#include <algorithm>
 #include <new>
 
 namespace Varnholt::UsbIo {
@@ -46,13 +47,19 @@ void CUsbIoBuffer::Collect() {
     if (Status == Errors::IoIncomplete) {
         Status = Errors::IoPending;
     }
+    LimitCount();
 }
 
 void CUsbIoBuffer::CancelAndCollect() {
     if (request.IsRunning()) {
         BytesTransferred = request.CancelAndWait();
         Status = Errors::OperationAborted;
+        LimitCount();
     }
+}
+
+void CUsbIoBuffer::LimitCount() {
+    BytesTransferred = std::min(BytesTransferred, Size);
 }
 
 }  // namespace Varnholt::UsbIo

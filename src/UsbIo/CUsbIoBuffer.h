@@ -48,6 +48,8 @@ class CUsbIoBuffer final {
     /// Cancels a transfer that still runs, waits for its end and fetches what it moved. By the thread that
     /// started it.
     void CancelAndCollect();
+    /// Whatever a driver reports, nobody is sent behind the end of the buffer.
+    void LimitCount();
 
     const Platform::OwnedHandle completionEvent;
     Platform::OverlappedRequest request;

@@ -56,6 +56,9 @@ class InterruptListener_Win64::Watch final {
     enum class State { Running, StopRequested, Ended };
 
     void SetReceiver(EventListener* receiver) {
+        if (WasEndedByForce()) {
+            return;  // no message can be under way, and nobody may be left to free the lock
+        }
         const ScopedLock delivering(deliveryLock);
         const ScopedLock held(lock);
         listener = receiver;
@@ -92,11 +95,16 @@ class InterruptListener_Win64::Watch final {
         // Cancelling from here would not reach the read, which is the thread's: woken, it cancels it itself.
         Platform::SignalEvent(wake.Get());
     }
-    /// True when the thread runs no further instruction. It holds no lock then that anybody still needs.
+    /// True when the thread runs no further instruction; it holds at most `deliveryLock` then.
     bool EndByForce(Platform::Handle thread) {
         const ScopedLock held(lock);
         listener = nullptr;
-        return Platform::EndThreadByForce(thread, ForcedExitCode);
+        endedByForce = Platform::EndThreadByForce(thread, ForcedExitCode);
+        return endedByForce;
+    }
+    bool WasEndedByForce() {
+        const ScopedLock held(lock);
+        return endedByForce;
     }
 
     void Run() {
@@ -123,6 +131,7 @@ class InterruptListener_Win64::Watch final {
     // Guarded by `lock`:
     State state = State::Ended;
     bool touched = false;
+    bool endedByForce = false;
     EventListener* listener = nullptr;
     std::thread::id threadId;
 };
@@ -234,8 +243,9 @@ void InterruptListener_Win64::Stop() try {
         ended = HasEnded(thread.Get(), StopRoundLimit);
     }
     if (!ended) {
-        // Its read may hang in the driver, which the end of the pipe is the end of.
-        pipe->Close();
+        if (watch->GetState() != Watch::State::Ended) {
+            pipe->Close();  // its read may hang in the driver, which the end of the pipe is the end of
+        }
         if (!HasEnded(thread.Get(), StopRoundLimit) && !watch->EndByForce(thread.Get())) {
             KeepForever(pipe);
         }

@@ -1,0 +1,241 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <mutex>
+
+#include "DeviceDriver/Ostra/LowLevel/Win64/InterruptListener_Win64.h"
+#include "Platform/CallFilter.h"
+#include "Platform/Threads.h"
+#include "Platform/Time.h"
+#include "Protocol/Instrument.h"
+#include "UsbIoTransportFixture.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+namespace {
+
+using namespace Protocol::UsbIoDriver;
+using Generic::MessageButtonData;
+using Generic::MessageDeviceGone;
+using Generic::Utilities::IOException;
+using Protocol::InterruptInEndpoint;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using Tests::TextOf;
+using Tests::UsbIoAnswer;
+using UsbIo::CUsbIoPipe;
+using Varnholt::Utilities::Tools::SmartPointer;
+
+constexpr std::uint32_t Never = UsbIoAnswer::Never;
+constexpr std::uint32_t Limit = 20000;
+
+class Receiver final : public Generic::EventListener {
+  public:
+    void MessageFromDevice(std::uint32_t code, std::uint32_t parameter) override {
+        EXPECT_EQ(parameter, 0U);
+        {
+            const std::lock_guard held(lock);
+            codes.push_back(code);
+        }
+        Platform::SignalEvent(arrived.Get());
+        if (onMessage) {
+            onMessage();
+        }
+    }
+    bool WaitForMessage() { return Platform::Wait(arrived.Get(), Limit) == Platform::WaitResult::Signalled; }
+    std::vector<std::uint32_t> Codes() {
+        const std::lock_guard held(lock);
+        return codes;
+    }
+
+    std::function<void()> onMessage;  ///< on the listener's thread
+
+  private:
+    Platform::OwnedHandle arrived{Platform::MakeAutoResetEvent()};
+    std::mutex lock;
+    std::vector<std::uint32_t> codes;
+};
+
+class InterruptListener_Win64Test : public testing::Test {
+  protected:
+    void SetUp() override {
+        ASSERT_EQ(pipe->Bind(0, InterruptInEndpoint, nullptr, nullptr), Status::Success);
+        listener.SetPipe(pipe);
+        listener.SetListener(&receiver);
+    }
+    /// The read that throws away what is left from before, and finds nothing.
+    void ScriptStaleRead() { driver.Script(InterruptInEndpoint, {.after = Never}); }
+    /// Until the listener has begun its next read.
+    void WaitForRead() {
+        while (driver.Running(InterruptInEndpoint) == 0) {
+            Platform::SleepMilliseconds(1);
+        }
+    }
+    std::uint32_t TimeOfStop() {
+        const std::uint32_t before = Platform::TickCount();
+        listener.Stop();
+        return Platform::TickCount() - before;
+    }
+
+    Tests::ScriptedUsbIo driver;
+    Platform::ScopedDeviceFiles files{driver};
+    Receiver receiver;
+    SmartPointer<CUsbIoPipe> pipe{new CUsbIoPipe};
+    InterruptListener_Win64 listener{"not used"};
+};
+
+TEST_F(InterruptListener_Win64Test, ReadsTurnIntoMessages) {
+    struct Case {
+        const char* name;
+        std::vector<UsbIoAnswer> reads;  ///< from the first one on that counts
+        std::vector<std::uint32_t> messages;
+        bool touched;
+    };
+    const UsbIoAnswer press{.data = {1}, .after = 5};
+    const UsbIoAnswer gone{.code = Status::DeviceGone, .after = 5};
+    const UsbIoAnswer silence{.after = Never};
+    const std::vector<Case> cases{
+        {"gone", {gone}, {MessageDeviceGone}, false},
+        {"gone at once", {{.code = Status::DeviceGone}}, {MessageDeviceGone}, false},
+        {"pressed twice",
+         {press, press, gone},
+         {MessageButtonData, MessageButtonData, MessageDeviceGone},
+         true},
+        {"silent, then pressed", {silence, press, gone}, {MessageButtonData, MessageDeviceGone}, true},
+        {"pressed as the read was given up",
+         {{.data = {1}, .after = Never, .cancelledWithData = true}, gone},
+         {MessageButtonData, MessageDeviceGone},
+         true},
+        {"an empty packet", {{.after = 5}, gone}, {MessageButtonData, MessageDeviceGone}, true},
+    };
+    for (const Case& row : cases) {
+        Receiver own;
+        InterruptListener_Win64 watching("not used");
+        watching.SetPipe(pipe);
+        watching.SetListener(&own);
+        ScriptStaleRead();
+        for (const UsbIoAnswer& read : row.reads) {
+            driver.Script(InterruptInEndpoint, read);
+        }
+        watching.Start();
+        for (std::size_t i = 0; i < row.messages.size() && own.Codes().size() < row.messages.size(); ++i) {
+            EXPECT_TRUE(own.WaitForMessage()) << row.name;
+        }
+        watching.Stop();
+        EXPECT_EQ(own.Codes(), row.messages) << row.name;
+        EXPECT_EQ(watching.IsTouched(), row.touched) << row.name;
+        EXPECT_EQ(driver.Running(InterruptInEndpoint), 0U) << row.name;
+    }
+}
+
+TEST_F(InterruptListener_Win64Test, AnInterruptFromBeforeIsThrownAway) {
+    driver.Script(InterruptInEndpoint, {.data = {1}, .after = 1});
+    listener.Start();
+    while (driver.TakeTranscript().size() < 2) {
+        Platform::SleepMilliseconds(5);
+    }
+    listener.Stop();
+    EXPECT_THAT(receiver.Codes(), IsEmpty());
+    EXPECT_FALSE(listener.IsTouched());
+}
+
+TEST_F(InterruptListener_Win64Test, StopsAtOnceInEveryPlace) {
+    EXPECT_EQ(TimeOfStop(), 0U) << "never started";
+    listener.Start();
+    WaitForRead();
+    EXPECT_LT(TimeOfStop(), 100U);
+    EXPECT_THAT(receiver.Codes(), IsEmpty());
+    EXPECT_EQ(driver.Running(InterruptInEndpoint), 0U);
+
+    // In every wait of its life: in the first read, in a later one, between two.
+    for (std::uint32_t i = 0; i < 30; ++i) {
+        InterruptListener_Win64 early("not used");
+        early.SetPipe(pipe);
+        early.SetListener(&receiver);
+        early.Start();
+        Platform::SleepMilliseconds(i);
+        const std::uint32_t before = Platform::TickCount();
+        early.Stop();
+        EXPECT_LT(Platform::TickCount() - before, 100U) << i;
+    }
+    EXPECT_THAT(receiver.Codes(), IsEmpty());
+}
+
+TEST_F(InterruptListener_Win64Test, AFailureDuringTheStopIsNoMessage) {
+    ScriptStaleRead();
+    driver.Script(InterruptInEndpoint, {.after = Never, .cancelledCode = Status::DeviceGone});
+    listener.Start();
+    while (driver.TakeTranscript().size() < 2) {
+        Platform::SleepMilliseconds(5);
+    }
+    WaitForRead();
+    listener.Stop();
+    EXPECT_THAT(receiver.Codes(), IsEmpty());
+}
+
+TEST_F(InterruptListener_Win64Test, TheReceiverCanBeTakenAwayFromInsideAMessage) {
+    ScriptStaleRead();
+    driver.Script(InterruptInEndpoint, {.data = {1}, .after = 1});
+    driver.Script(InterruptInEndpoint, {.data = {1}, .after = 1});
+    receiver.onMessage = [this] { listener.ClearListener(); };
+    listener.Start();
+    ASSERT_TRUE(receiver.WaitForMessage());
+    WaitForRead();
+    listener.Stop();
+    EXPECT_THAT(receiver.Codes(), ElementsAre(MessageButtonData));
+}
+
+TEST_F(InterruptListener_Win64Test, NoMessageIsUnderWayOnceTheReceiverIsTakenAway) {
+    std::atomic<bool> inMessage = false;
+    receiver.onMessage = [&] {
+        inMessage = true;
+        Platform::SleepMilliseconds(100);
+        inMessage = false;
+    };
+    ScriptStaleRead();
+    driver.Script(InterruptInEndpoint, {.data = {1}, .after = 1});
+    listener.Start();
+    ASSERT_TRUE(receiver.WaitForMessage());
+    listener.ClearListener();
+    EXPECT_FALSE(inMessage);
+    listener.Stop();
+}
+
+TEST_F(InterruptListener_Win64Test, CanBeStoppedFromInsideAMessage) {
+    ScriptStaleRead();
+    driver.Script(InterruptInEndpoint, {.data = {1}, .after = 1});
+    const Platform::OwnedHandle stopped(Platform::MakeAutoResetEvent());
+    receiver.onMessage = [&] {
+        listener.Stop();
+        Platform::SignalEvent(stopped.Get());
+    };
+    listener.Start();
+    EXPECT_EQ(Platform::Wait(stopped.Get(), 5000), Platform::WaitResult::Signalled);
+    listener.ClearListener();
+}
+
+TEST_F(InterruptListener_Win64Test, AReceiverThatDoesNotReturnDoesNotHoldUpTheStopForEver) {
+    const Platform::OwnedHandle release(Platform::MakeAutoResetEvent());
+    receiver.onMessage = [&] { Platform::Wait(release.Get(), Platform::Infinite); };
+    ScriptStaleRead();
+    driver.Script(InterruptInEndpoint, {.data = {1}, .after = 1});
+    listener.Start();
+    ASSERT_TRUE(receiver.WaitForMessage());
+    EXPECT_LE(TimeOfStop(), 11500U);
+    EXPECT_FALSE(pipe->IsOpen());
+    Platform::SignalEvent(release.Get());
+    listener.ClearListener();  // waits for the message where the platform could not end the thread
+}
+
+TEST_F(InterruptListener_Win64Test, SaysWhenTheThreadCannotBeMade) {
+    Platform::InstallCallFilter([](std::string_view call) {
+        return call == "StartThread" ? Platform::Errors::NoSystemResources : 0;
+    });
+    EXPECT_EQ(TextOf<IOException>([this] { listener.Start(); }),
+              "could not create interrupt listener thread");
+    Platform::InstallCallFilter({});
+    listener.Stop();
+}
+
+}  // namespace
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -1,0 +1,269 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <mutex>
+#include <numeric>
+
+#include "Platform/ScopedThreadPriority.h"
+#include "Platform/Time.h"
+#include "Protocol/Instrument.h"
+#include "UsbIoTransportFixture.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+namespace {
+
+using namespace Protocol::UsbIoDriver;
+using Generic::Utilities::DataException;
+using Generic::Utilities::IOException;
+using Protocol::BulkInEndpoint;
+using testing::ElementsAreArray;
+using Tests::TextOf;
+using Tests::UsbIoAnswer;
+using Tests::VendorOut;
+using Bytes = std::vector<std::uint8_t>;
+
+constexpr std::uint32_t Never = UsbIoAnswer::Never;
+constexpr std::uint32_t Whole = 65536;
+
+/// Bytes of a stream, different from one 256-byte record to the next.
+Bytes Stream(std::size_t from, std::size_t count) {
+    Bytes bytes(count);
+    for (std::size_t i = 0; i < count; ++i) {
+        const std::size_t place = from + i;
+        bytes[i] = static_cast<std::uint8_t>(place * 7 + place / 256 * 13);
+    }
+    return bytes;
+}
+
+class UsbIoScanTest : public Tests::UsbIoTransportFixture {
+  protected:
+    UsbIoScanTest() {
+        Platform::ObserveBeeps([this](std::uint32_t hertz, std::uint32_t milliseconds) {
+            const std::lock_guard held(beepLock);
+            beeps.emplace_back(hertz, milliseconds);
+            Platform::SignalEvent(beeped.Get());
+        });
+    }
+    ~UsbIoScanTest() override { Platform::ObserveBeeps({}); }
+
+    /// The instrument sends the stream in transfers of these sizes, one after the other.
+    void Send(const std::vector<std::uint32_t>& sizes, std::uint32_t after) {
+        for (const std::uint32_t size : sizes) {
+            driver.Script(BulkInEndpoint, {.data = Stream(sent, size), .after = after});
+            sent += size;
+        }
+    }
+
+    static Bytes TakeAll(PellandoFunctionalityByte& instrument, std::uint32_t piece) {
+        Bytes all;
+        for (;;) {
+            Bytes part(piece);
+            std::uint32_t size = piece;
+            instrument.GetScanData(part.data(), &size);
+            if (size == 0) {
+                return all;
+            }
+            all.insert(all.end(), part.begin(), part.begin() + size);
+        }
+    }
+
+    std::size_t sent = 0;
+    std::mutex beepLock;
+    std::vector<std::pair<std::uint32_t, std::uint32_t>> beeps;
+    Platform::OwnedHandle beeped{Platform::MakeAutoResetEvent()};
+};
+
+std::string Read(std::uint32_t size) {
+    return "read 82 [" + std::to_string(size) + "]";
+}
+
+TEST_F(UsbIoScanTest, FixedScans) {
+    struct Case {
+        const char* name;
+        std::uint32_t total;
+        std::vector<std::uint32_t> transfers;  ///< what the instrument sends
+        std::vector<std::uint32_t> reads;      ///< what it is asked for
+        bool cancels;
+        std::uint32_t end;
+    };
+    const std::vector<Case> cases{
+        {"two transfers", 100000, {Whole, 34464, 0}, {Whole, 34464, 0, 0}, true, 100000},
+        {"short", 100000, {Whole, 4464}, {Whole, 34464, 0}, true, 70000},
+        {"short at once", 100000, {10}, {Whole, 34464}, true, 10},
+        {"empty at once", 100000, {0}, {Whole, 34464}, true, 0},
+        {"less than a transfer", 256, {256, 0}, {256, 0, 0}, true, 256},
+        {"one byte", 1, {1, 0}, {1, 0, 0}, true, 1},
+        {"a whole transfer", Whole, {Whole, 0}, {Whole, 0, 0}, true, Whole},
+        {"a byte more", Whole + 1, {Whole, 1, 0}, {Whole, 1, 0, 0}, true, Whole + 1},
+        {"several", 3 * Whole, {Whole, Whole, Whole, 0}, {Whole, Whole, Whole, 0, 0}, true, 3 * Whole},
+    };
+    for (const std::uint32_t after : {0U, 1U}) {
+        for (const Case& row : cases) {
+            const auto instrument = Open();
+            sent = 0;
+            Send(row.transfers, after);
+            instrument->StartScan(256, 1, row.total);
+            std::vector<std::string> expected{VendorOut(0xC0)};
+            for (const std::uint32_t size : row.reads) {
+                expected.push_back(Read(size));
+            }
+            if (row.cancels) {
+                expected.emplace_back("cancel 82");
+            }
+            EXPECT_THAT(TakeTransfers(), ElementsAreArray(expected)) << row.name;
+            EXPECT_EQ(TakeAll(*instrument, 256), Stream(0, row.end)) << row.name;
+            EXPECT_EQ(driver.Running(BulkInEndpoint), 0U) << row.name;
+        }
+    }
+    EXPECT_TRUE(beeps.empty());
+}
+
+TEST_F(UsbIoScanTest, OpenEndedScansGrow) {
+    const auto instrument = Open();
+    for (const std::uint32_t total : {0U, 256U, Whole, 1280000U, 2000000U}) {
+        sent = 0;
+        Send(std::vector<std::uint32_t>(total / Whole, Whole), 0);
+        Send({total % Whole}, 1);
+        instrument->StartScan(256, 1, 0);
+        EXPECT_EQ(TakeAll(*instrument, 100000), Stream(0, total)) << total;
+        EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+        // Each scan beeps once, and the beep comes by itself.
+        ASSERT_EQ(Platform::Wait(beeped.Get(), 10000), Platform::WaitResult::Signalled);
+        const std::lock_guard held(beepLock);
+        EXPECT_EQ(beeps, (std::vector<std::pair<std::uint32_t, std::uint32_t>>{{2140, 75}})) << total;
+        beeps.clear();
+    }
+}
+
+TEST_F(UsbIoScanTest, AReadIsPendingWhileTheOtherIsProcessed) {
+    // An instrument that completes a transfer only when it has got the next one.
+    const auto instrument = Open();
+    std::vector<bool> completed;
+    const auto completeOther = [&] { completed.push_back(driver.Complete(BulkInEndpoint)); };
+    for (int i = 0; i < 4; ++i) {
+        driver.Script(BulkInEndpoint,
+                      {.data = Stream(sent, Whole), .after = Never, .onStart = completeOther});
+        sent += Whole;
+    }
+    driver.Script(BulkInEndpoint, {.after = 1, .onStart = completeOther});
+    instrument->StartScan(256, 1, static_cast<std::uint32_t>(sent));
+    EXPECT_THAT(completed, testing::ElementsAre(false, true, true, true, true));
+    EXPECT_EQ(TakeAll(*instrument, Whole), Stream(0, sent));
+}
+
+TEST_F(UsbIoScanTest, WhatComesBehindTheEndIsDropped) {
+    const auto instrument = Open();
+    driver.Script(BulkInEndpoint, {.data = Stream(0, 100), .after = 2});
+    driver.Script(BulkInEndpoint,
+                  {.data = Bytes(50, 0xEE), .after = Never, .cancelledAfter = 20, .cancelledWithData = true});
+    instrument->StartScan(256, 1, 1000);
+    EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+    EXPECT_EQ(TakeAll(*instrument, 64), Stream(0, 100));
+}
+
+TEST_F(UsbIoScanTest, FailedScansLeaveNothing) {
+    struct Case {
+        const char* name;
+        UsbIoAnswer answer;
+        const char* text;
+        std::uint32_t waits;
+    };
+    const char* const timedOut =
+        "Error in UsbIo function: \"WaitForCompletion1\" Error: Error code 0xE000100C: The request has been "
+        "timed out.";
+    const char* const halted =
+        "Error in UsbIo function: \"WaitForCompletion1\" Error: Error code 0xE0000030: USBD Error: Endpoint "
+        "halted.";
+    // The second of 3 reads, of 65536 bytes: 256 records of 15 ms and 5 s.
+    const std::vector<Case> cases{
+        {"silent", {.after = Never, .cancelledAfter = 30}, timedOut, 8840},
+        {"silent, moved by the cancellation",
+         {.data = Bytes(9), .after = Never, .cancelledWithData = true},
+         timedOut,
+         8840},
+        {"fails", {.code = Status::EndpointHalted, .after = 3}, halted, 0},
+        {"fails at once", {.code = Status::EndpointHalted}, halted, 0},
+        {"cannot be started", {.code = Status::EndpointHalted, .refused = true}, halted, 0},
+    };
+    const auto instrument = Open();
+    for (const Case& row : cases) {
+        sent = 0;
+        Send({Whole}, 1);
+        driver.Script(BulkInEndpoint, row.answer);
+        const int priority = Platform::CurrentThreadPriority();
+        const std::uint32_t before = Platform::TickCount();
+        EXPECT_EQ(TextOf<IOException>([&] { instrument->StartScan(256, 1, 3 * Whole); }), row.text)
+            << row.name;
+        EXPECT_GE(Platform::TickCount() - before, row.waits) << row.name;
+        EXPECT_LE(Platform::TickCount() - before, row.waits + 200) << row.name;
+        EXPECT_EQ(Platform::CurrentThreadPriority(), priority);
+        EXPECT_EQ(driver.Running(BulkInEndpoint), 0U) << row.name;
+        EXPECT_EQ(TakeAll(*instrument, 256), Bytes()) << row.name;
+    }
+    sent = 0;
+    Send({10}, 1);
+    instrument->StartScan(256, 1, 10000);
+    EXPECT_EQ(TakeAll(*instrument, 256), Stream(0, 10)) << "and the next one works";
+}
+
+TEST_F(UsbIoScanTest, ThePriorityIsRaisedForTheScanOnly) {
+    const auto instrument = Open();
+    const Platform::ScopedThreadPriority usual(-1);
+    const int before = Platform::CurrentThreadPriority();
+    int during = -99;
+    driver.Script(BulkInEndpoint, {.data = Bytes(5), .after = 1, .onStart = [&] {
+                                       during = Platform::CurrentThreadPriority();
+                                   }});
+    instrument->StartScan(256, 1, 1000);
+    // Where the system refuses a level, it stays as it was.
+    const bool mayRaise = [] {
+        const Platform::ScopedThreadPriority raised(Platform::HighestThreadPriority);
+        return Platform::CurrentThreadPriority() == Platform::HighestThreadPriority;
+    }();
+    EXPECT_EQ(during, mayRaise ? Platform::HighestThreadPriority : before);
+    EXPECT_EQ(Platform::CurrentThreadPriority(), before);
+}
+
+TEST_F(UsbIoScanTest, DataAreHandedOutInPiecesAndNeverBehindTheEnd) {
+    const auto instrument = Open();
+    std::uint32_t size = 4;
+    Bytes part(8, 0xEE);
+    instrument->GetScanData(part.data(), &size);
+    EXPECT_EQ(size, 0U) << "without a scan";
+
+    Send({10}, 1);
+    instrument->StartScan(256, 1, 5000);
+    std::vector<std::uint32_t> sizes;
+    Bytes all;
+    for (int i = 0; i < 4; ++i) {
+        part.assign(8, 0xEE);
+        size = 4;
+        instrument->GetScanData(part.data(), &size);
+        sizes.push_back(size);
+        all.insert(all.end(), part.begin(), part.begin() + size);
+        EXPECT_EQ(part[size], 0xEE);
+    }
+    EXPECT_THAT(sizes, testing::ElementsAre(4, 4, 2, 0));
+    EXPECT_EQ(all, Stream(0, 10));
+}
+
+TEST_F(UsbIoScanTest, MoreThanWasAskedForIsRefused) {
+    // No driver should report more than a read asked for; where one does, a fixed scan stays within its size.
+    const auto instrument = Open();
+    const auto scanTooMuch = [&] {
+        driver.Script(BulkInEndpoint, {.data = Bytes(100), .after = 1, .reportedCount = 101});
+        instrument->StartScan(256, 1, 100);
+    };
+    EXPECT_EQ(TextOf<DataException>(scanTooMuch), "buffer size is fix");
+    EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+    sent = 0;
+    Send({5000, 0}, 1);
+    instrument->StartScan(256, 1, 5000);
+    // Now there would be room for it.
+    EXPECT_EQ(TextOf<DataException>(scanTooMuch), "more bytes read than expected");
+    EXPECT_EQ(TakeAll(*instrument, 256), Bytes());
+}
+
+}  // namespace
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -1,0 +1,192 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <vector>
+
+#include "Platform/CallFilter.h"
+#include "Platform/Time.h"
+#include "Protocol/Instrument.h"
+#include "Support/ScriptedUsbIo.h"
+#include "UsbIo/CUsbIoPipe.h"
+#include "UsbIo/ScopedDeviceList.h"
+
+namespace Varnholt::UsbIo {
+namespace {
+
+using namespace Protocol::UsbIoDriver;
+using namespace Protocol;
+using testing::Each;
+using testing::ElementsAre;
+using Tests::ScriptedUsbIo;
+using Tests::UsbIoAnswer;
+
+constexpr std::uint32_t Never = UsbIoAnswer::Never;
+constexpr std::uint32_t Pending = Platform::Errors::IoPending;
+
+class CUsbIoPipeTest : public testing::Test {
+  protected:
+    void SetUp() override {
+        const ScopedDeviceList list(InterfaceClass);
+        ASSERT_EQ(pipe.Bind(0, BulkInEndpoint, list.Get(), &InterfaceClass), Status::Success);
+        driver.TakeTranscript();
+    }
+
+    ScriptedUsbIo driver;
+    Platform::ScopedDeviceFiles files{driver};
+    CUsbIoPipe pipe;
+};
+
+TEST_F(CUsbIoPipeTest, BindOpensOnlyAClosedPipe) {
+    EXPECT_EQ(pipe.Bind(0, BulkOutEndpoint, nullptr, nullptr), Status::Success);
+    EXPECT_EQ(pipe.AbortPipe(), Status::Success);
+    EXPECT_THAT(driver.TakeTranscript(), ElementsAre("control 80942078 03 /", "control 80942084 /"));
+    CUsbIoPipe other;
+    driver.RefuseOpen("\\\\.\\USBIO_Device7", Platform::Errors::AccessDenied);
+    EXPECT_EQ(other.Bind(7, BulkInEndpoint, nullptr, nullptr), Platform::Errors::AccessDenied);
+    EXPECT_FALSE(other.IsOpen());
+}
+
+TEST_F(CUsbIoPipeTest, ReadSyncReportsStatusAndBytesMoved) {
+    struct Case {
+        const char* name;
+        UsbIoAnswer answer;
+        std::uint32_t timeout;
+        std::uint32_t status;
+        std::uint32_t moved;
+    };
+    const std::vector<std::uint8_t> data{1, 2, 3, 4};
+    const std::vector<Case> cases{
+        {"at once", {.data = data}, 100, 0, 4},
+        {"later", {.data = data, .after = 50}, 100, 0, 4},
+        {"short", {.data = {1}, .after = 5}, Platform::Infinite, 0, 1},
+        {"empty", {.after = 5}, 100, 0, 0},
+        {"refused", {.code = 6, .refused = true}, 100, 6, 0},
+        {"fails at once", {.code = Status::NotBound}, 100, Status::NotBound, 0},
+        {"fails later with data",
+         {.data = {1, 2}, .code = Status::EndpointHalted, .after = 5},
+         100,
+         Status::EndpointHalted,
+         2},
+        {"silent", {.after = Never}, 100, Status::TimedOut, 0},
+        {"late", {.data = data, .after = 150}, 100, Status::TimedOut, 0},
+        {"cancelled with data",
+         {.data = {1, 2, 3}, .after = Never, .cancelledWithData = true},
+         100,
+         Status::TimedOut,
+         3},
+        {"completed against the cancellation",
+         {.data = data, .after = Never, .cancelledAfter = 30, .cancelledCode = 0, .cancelledWithData = true},
+         100,
+         Status::TimedOut,
+         4},
+        {"not waited for", {.data = data, .after = Never}, 0, Status::TimedOut, 0},
+    };
+    for (const Case& row : cases) {
+        driver.Script(BulkInEndpoint, row.answer);
+        std::vector<std::uint8_t> buffer(4, 0xEE);
+        std::uint32_t size = 4;
+        EXPECT_EQ(pipe.ReadSync(buffer.data(), size, row.timeout), row.status) << row.name;
+        EXPECT_EQ(size, row.moved) << row.name;
+        std::vector<std::uint8_t> expected(4, 0xEE);
+        std::copy_n(data.begin(), row.moved, expected.begin());
+        EXPECT_EQ(buffer, expected) << row.name;
+        EXPECT_EQ(driver.Running(BulkInEndpoint), 0U) << row.name;
+    }
+}
+
+TEST_F(CUsbIoPipeTest, ATimedOutReadReturnsOnlyWhenItsBufferIsFree) {
+    driver.Script(BulkInEndpoint,
+                  {.data = {7, 7}, .after = Never, .cancelledAfter = 60, .cancelledWithData = true});
+    std::vector<std::uint8_t> buffer(2);
+    std::uint32_t size = 2;
+    const std::uint32_t before = Platform::TickCount();
+    EXPECT_EQ(pipe.ReadSync(buffer.data(), size, 100), Status::TimedOut);
+    EXPECT_GE(Platform::TickCount() - before, 150U);
+    EXPECT_THAT(buffer, Each(7));
+}
+
+TEST_F(CUsbIoPipeTest, WriteSyncSendsTheBytes) {
+    const std::vector<std::uint8_t> data{1, 0x2C};
+    std::uint32_t size = 2;
+    driver.Script(BulkInEndpoint, {.after = 10});
+    EXPECT_EQ(pipe.WriteSync(data.data(), size, Platform::Infinite), Status::Success);
+    EXPECT_EQ(size, 2U);
+    driver.Script(BulkInEndpoint, {.after = Never});
+    EXPECT_EQ(pipe.WriteSync(data.data(), size, 20), Status::TimedOut);
+    EXPECT_EQ(size, 0U);
+    EXPECT_THAT(driver.TakeTranscript(), ElementsAre("write 82 01 2C", "write 82 01 2C", "cancel 82"));
+}
+
+TEST_F(CUsbIoPipeTest, AnEventEndsTheWaitButNotTheTransfer) {
+    const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
+    driver.Script(BulkInEndpoint, {.data = {5}, .after = 80});
+    CUsbIoBuffer buffer(8);
+    buffer.NumberOfBytesToTransfer = 8;
+    ASSERT_TRUE(pipe.Read(buffer));
+    EXPECT_EQ(buffer.Status, Pending);
+    EXPECT_EQ(pipe.WaitForCompletion(buffer, 0), Status::TimedOut);
+    EXPECT_EQ(pipe.WaitForCompletion(buffer, 20, event.Get()), Status::TimedOut);
+    Platform::SignalEvent(event.Get());
+    EXPECT_EQ(pipe.WaitForCompletion(buffer, Platform::Infinite, event.Get()), Status::UserEvent);
+    EXPECT_EQ(buffer.Status, Pending);
+    EXPECT_EQ(pipe.WaitForCompletion(buffer, Platform::Infinite, event.Get()), Status::Success);
+    EXPECT_EQ(buffer.BytesTransferred, 1U);
+    EXPECT_EQ(pipe.WaitForCompletion(buffer, Platform::Infinite), Status::Success);
+}
+
+TEST_F(CUsbIoPipeTest, AWaitThatThePlatformRefusesIsPassedOn) {
+    driver.Script(BulkInEndpoint, {.after = Never});
+    CUsbIoBuffer buffer(8);
+    buffer.NumberOfBytesToTransfer = 8;
+    ASSERT_TRUE(pipe.Read(buffer));
+    char noHandle = 0;
+    EXPECT_EQ(pipe.WaitForCompletion(buffer, 10, &noHandle), 0xFFFFFFFF);
+    EXPECT_EQ(buffer.Status, Pending);
+}
+
+TEST_F(CUsbIoPipeTest, RefusesTransfersThatCannotBeRight) {
+    CUsbIoBuffer buffer(8);
+    buffer.NumberOfBytesToTransfer = 9;
+    EXPECT_FALSE(pipe.Read(buffer));
+    EXPECT_EQ(buffer.Status, Platform::Errors::InvalidParameter);
+    buffer.NumberOfBytesToTransfer = 8;
+    pipe.Close();
+    EXPECT_FALSE(pipe.Write(buffer));
+    EXPECT_EQ(buffer.Status, Platform::Errors::InvalidHandle);
+
+    Platform::InstallCallFilter([](std::string_view) { return Platform::Errors::NoSystemResources; });
+    CUsbIoBuffer withoutEvent(8);
+    Platform::InstallCallFilter({});
+    withoutEvent.NumberOfBytesToTransfer = 8;
+    EXPECT_FALSE(pipe.Read(withoutEvent));
+    EXPECT_EQ(withoutEvent.Status, Platform::Errors::NoSystemResources);
+}
+
+TEST_F(CUsbIoPipeTest, ABufferOutlivesItsTransfer) {
+    driver.Script(BulkInEndpoint,
+                  {.data = {1, 2}, .after = Never, .cancelledAfter = 40, .cancelledWithData = true});
+    {
+        CUsbIoBuffer buffer(2);
+        buffer.NumberOfBytesToTransfer = 2;
+        ASSERT_TRUE(pipe.Read(buffer));
+    }
+    EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+}
+
+TEST_F(CUsbIoPipeTest, TransfersOfOnePipeOverlap) {
+    driver.Script(BulkInEndpoint, {.data = {1}, .after = 20});
+    driver.Script(BulkInEndpoint, {.data = {2, 3}, .after = 30});
+    CUsbIoBuffer first(4);
+    CUsbIoBuffer second(4);
+    first.NumberOfBytesToTransfer = second.NumberOfBytesToTransfer = 4;
+    ASSERT_TRUE(pipe.Read(first));
+    ASSERT_TRUE(pipe.Read(second));
+    EXPECT_EQ(driver.Running(BulkInEndpoint), 2U);
+    EXPECT_EQ(pipe.WaitForCompletion(second, 1000), Status::Success);
+    EXPECT_EQ(pipe.WaitForCompletion(first, 1000), Status::Success);
+    EXPECT_EQ(first.BytesTransferred, 1U);
+    EXPECT_EQ(second.BytesTransferred, 2U);
+}
+
+}  // namespace
+}  // namespace Varnholt::UsbIo

@@ -1,0 +1,261 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <array>
+#include <string>
+
+#include "Platform/CallFilter.h"
+#include "Platform/Threads.h"
+#include "Support/ScriptedUsbIo.h"
+#include "UsbIo/CUsbIo.h"
+#include "UsbIo/ScopedDeviceList.h"
+
+namespace Varnholt::UsbIo {
+namespace {
+
+using namespace Protocol::UsbIoDriver;
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::IsEmpty;
+using testing::Not;
+using Tests::ScriptedUsbIo;
+
+TEST(CUsbIoErrorText, TextsAreThoseOfTheTable) {
+    const std::vector<std::pair<std::uint32_t, const char*>> cases{
+        {0, "Error code 0x00000000: No error."},
+        {0xE0000001, "Error code 0xE0000001: HC Error: Wrong CRC."},
+        {0xE000000E, "Error code 0xE000000E: Windows system error code."},
+        {0xE0001000, "Error code 0xE0001000: Operation failed."},
+        {0xE8001000, "Error code 0xE8001000: USBD Error: Insufficient resources."},
+        {0xE0001005, "Error code 0xE0001005: USB device is already configured."},
+        {0xE000100C, "Error code 0xE000100C: The request has been timed out."},
+        {0xE0001019, "Error code 0xE0001019: Windows system error code."},
+        {Status::UserEvent, "Error code 0xE000101E: Windows system error code."},
+        {Status::NoEnumeration, "Error code 0xE0001106: Windows system error code."},
+        {0xE0001107, "Error code 0xE0001107: The handle is already opened."},
+        {5, "Error code 0x00000005: Windows system error code."},
+    };
+    for (const auto& [status, expected] : cases) {
+        std::array<char, 200> text;
+        EXPECT_STREQ(CUsbIo::ErrorText(text.data(), text.size(), status), expected);
+    }
+}
+
+TEST(CUsbIoErrorText, IsCutToTheBuffer) {
+    const std::string whole = "Error code 0x00000000: No error.";
+    for (const std::size_t size :
+         {std::size_t{0}, std::size_t{1}, std::size_t{10}, whole.size(), whole.size() + 1}) {
+        std::string buffer(64, '#');
+        EXPECT_EQ(CUsbIo::ErrorText(buffer.data(), size, 0), buffer.data());
+        const std::string written = size == 0 ? "" : whole.substr(0, size - 1) + '\0';
+        EXPECT_EQ(buffer, written + std::string(64 - written.size(), '#')) << size;
+    }
+    EXPECT_EQ(CUsbIo::ErrorText(nullptr, 10, 0), nullptr);
+}
+
+class CUsbIoTest : public testing::Test {
+  protected:
+    std::uint32_t Open(CUsbIo& device, int number = 0) {
+        const ScopedDeviceList list(InterfaceClass);
+        return device.Open(number, list.Get(), &InterfaceClass);
+    }
+
+    ScriptedUsbIo driver{{"usbio/1", "usbio/2"}};
+    Platform::ScopedDeviceFiles files{driver};
+};
+
+TEST_F(CUsbIoTest, OpensByListAndByNumber) {
+    CUsbIo device;
+    EXPECT_EQ(device.GetDevicePathName(), nullptr);
+    EXPECT_EQ(Open(device, 1), Status::Success);
+    EXPECT_STREQ(device.GetDevicePathName(), "usbio/2");
+    EXPECT_EQ(Open(device, 0), Status::AlreadyOpen);
+    EXPECT_STREQ(device.GetDevicePathName(), "usbio/2");
+    DriverInfo info;
+    EXPECT_EQ(device.GetDriverInfo(info), Status::Success);
+    device.Close();
+    EXPECT_EQ(device.GetDevicePathName(), nullptr);
+    EXPECT_EQ(device.Open(3, nullptr, nullptr), Status::Success);
+    EXPECT_EQ(device.GetDevicePathName(), nullptr);
+    device.Close();
+    const std::string ask = "control 8094206C / [12]";
+    EXPECT_THAT(driver.TakeTranscript(),
+                ElementsAre("open usbio/2", ask, ask, "close usbio/2", "open \\\\.\\USBIO_Device3", ask,
+                            "close \\\\.\\USBIO_Device3"));
+}
+
+TEST_F(CUsbIoTest, AcceptsInterfaceVersions2From30On) {
+    const std::vector<std::pair<std::uint16_t, std::uint32_t>> cases{
+        {0x0230, 0},
+        {0x02FF, 0},
+        {0x022F, Status::VersionMismatch},
+        {0x0300, Status::VersionMismatch},
+        {0x0330, Status::VersionMismatch},
+        {0x0130, Status::VersionMismatch},
+        {0x3002, Status::VersionMismatch},
+    };
+    for (const auto& [version, expected] : cases) {
+        driver.ScriptControl(Control::GetDriverInfo, {.data = {static_cast<std::uint8_t>(version),
+                                                               static_cast<std::uint8_t>(version >> 8)}});
+        CUsbIo device;
+        EXPECT_EQ(Open(device), expected) << std::hex << version;
+        EXPECT_EQ(driver.OpenFiles(), expected == 0 ? 1U : 0U);
+        EXPECT_EQ(device.GetDevicePathName() != nullptr, expected == 0);
+    }
+}
+
+TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
+    struct Case {
+        const char* name;
+        int number;
+        std::function<void()> arrange;
+        std::uint32_t expected;
+    };
+    const auto failing = [](std::string_view which, Platform::ErrorCode code) {
+        Platform::InstallCallFilter(
+            [which, code](std::string_view call) { return call == which ? code : 0; });
+    };
+    const std::vector<Case> cases{
+        {"no such device", 2, [] {}, Status::NoSuchDeviceInstance},
+        {"negative number", -1, [] {}, Status::NoSuchDeviceInstance},
+        {"file not found", 0, [&] { driver.RefuseOpen("usbio/1", 2); }, Status::DeviceNotFound},
+        {"file refused", 0, [&] { driver.RefuseOpen("usbio/1", 5); }, 5},
+        {"no event", 1, [&] { failing("MakeAutoResetEvent", 8); }, Status::NoMemory},
+        {"driver refuses", 1, [&] { driver.ScriptControl(Control::GetDriverInfo, {.code = 31, .after = 5}); },
+         31},
+        {"driver tells nothing", 1, [&] { driver.ScriptControl(Control::GetDriverInfo, {}); },
+         Status::VersionMismatch},
+    };
+    for (const Case& row : cases) {
+        row.arrange();
+        CUsbIo device;
+        EXPECT_EQ(Open(device, row.number), row.expected) << row.name;
+        Platform::InstallCallFilter({});
+        EXPECT_FALSE(device.IsOpen()) << row.name;
+        EXPECT_EQ(device.GetDevicePathName(), nullptr) << row.name;
+        EXPECT_EQ(driver.OpenFiles(), 0U) << row.name;
+        EXPECT_EQ(Open(device, 1), Status::Success) << row.name;
+    }
+    const ScopedDeviceList list(InterfaceClass);
+    EXPECT_EQ(CUsbIo().Open(0, list.Get(), nullptr), Status::InvalidFunctionParameter);
+}
+
+TEST_F(CUsbIoTest, DeviceListsAreMadeAndDestroyed) {
+    EXPECT_TRUE(CUsbIo::DestroyDeviceList(nullptr));
+    EXPECT_EQ(CUsbIo::CreateDeviceList(nullptr), nullptr);
+    const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+    ASSERT_NE(list, nullptr);
+    EXPECT_TRUE(CUsbIo::DestroyDeviceList(list));
+}
+
+TEST_F(CUsbIoTest, AClosedObjectTouchesNothing) {
+    CUsbIo device;
+    DriverInfo info;
+    DeviceParameters parameters;
+    std::uint32_t length = 0;
+    EXPECT_EQ(device.GetDriverInfo(info), Status::DeviceNotOpen);
+    EXPECT_EQ(device.UnconfigureDevice(), Status::DeviceNotOpen);
+    EXPECT_EQ(device.SetConfiguration({}), Status::DeviceNotOpen);
+    EXPECT_EQ(device.GetDeviceParameters(parameters), Status::DeviceNotOpen);
+    EXPECT_EQ(device.ClassOrVendorOutRequest(nullptr, length, {}), Status::DeviceNotOpen);
+    device.Close();
+    EXPECT_THAT(driver.TakeTranscript(), IsEmpty());
+}
+
+TEST_F(CUsbIoTest, SendsTheDriversRecords) {
+    CUsbIo device;
+    ASSERT_EQ(Open(device), Status::Success);
+    driver.TakeTranscript();
+
+    const std::array<InterfaceSetting, 2> interfaces{{{0, 1, 65536}, {0x0203, 0x0405, 0x06070809}}};
+    EXPECT_EQ(device.UnconfigureDevice(), 0U);
+    EXPECT_EQ(device.SetConfiguration({0x0102, interfaces}), 0U);
+    DeviceParameters parameters;
+    EXPECT_EQ(device.GetDeviceParameters(parameters), 0U);
+    EXPECT_THAT(parameters.words, ElementsAre(0x11, 0x22));
+    EXPECT_EQ(device.SetDeviceParameters({{0x01020304, 0x05060708}}), 0U);
+
+    ClassOrVendorRequest request;
+    request.flags = 0x01020304;
+    request.type = 2;
+    request.recipient = 0x0A0B0C0D;
+    request.reservedBits = 0x55;
+    request.request = 0xC0;
+    request.value = 0x1234;
+    request.index = 0x5678;
+    std::array<std::uint8_t, 3> data{1, 2, 3};
+    std::uint32_t length = data.size();
+    EXPECT_EQ(device.ClassOrVendorOutRequest(data.data(), length, request), 0U);
+    EXPECT_EQ(length, 3U);
+    driver.ScriptControl(Control::ClassOrVendorInRequest, {.data = {9, 8}, .after = 3});
+    EXPECT_EQ(device.ClassOrVendorInRequest(data.data(), length, request), 0U);
+    EXPECT_EQ(length, 2U);
+    EXPECT_THAT(data, ElementsAre(9, 8, 3));
+
+    std::string unused;
+    for (int i = 0; i < 30 * 8; ++i) {
+        unused += " 00";
+    }
+    const std::string block = " 04 03 02 01 02 00 00 00 0D 0C 0B 0A 55 C0 34 12 78 56";
+    EXPECT_THAT(
+        driver.TakeTranscript(),
+        ElementsAre(
+            "control 80942028 /",
+            "control 80942024 02 01 02 00 00 00 01 00 00 00 01 00 03 02 05 04 09 08 07 06" + unused + " /",
+            "control 8094203C / [8]", "control 80942040 04 03 02 01 08 07 06 05 /",
+            "control 80942035" + block + " / 01 02 03", "control 80942032" + block + " / [3]"));
+
+    const std::array<InterfaceSetting, ConfigurationBlock::MaximumEntries + 1> tooMany{};
+    EXPECT_EQ(device.SetConfiguration({0, tooMany}), Status::InvalidFunctionParameter);
+    EXPECT_THAT(driver.TakeTranscript(), IsEmpty());
+}
+
+TEST_F(CUsbIoTest, ControlsReportHowTheyEnd) {
+    struct Case {
+        const char* name;
+        Tests::UsbIoAnswer answer;
+        std::uint32_t status;
+        std::uint32_t moved;
+    };
+    const std::vector<Case> cases{
+        {"at once", {.data = {1, 2}}, 0, 2},
+        {"later", {.data = {1}, .after = 20}, 0, 1},
+        {"refused", {.code = 170, .refused = true}, 170, 0},
+        {"fails at once", {.code = Status::NotConfigured}, Status::NotConfigured, 0},
+        {"fails later with data",
+         {.data = {1, 2, 3}, .code = Status::DeviceRemoved, .after = 20},
+         Status::DeviceRemoved,
+         3},
+    };
+    CUsbIo device;
+    ASSERT_EQ(Open(device), Status::Success);
+    for (const Case& row : cases) {
+        driver.ScriptControl(Control::ClassOrVendorInRequest, row.answer);
+        std::array<std::uint8_t, 4> data{};
+        std::uint32_t length = data.size();
+        EXPECT_EQ(device.ClassOrVendorInRequest(data.data(), length, {}), row.status) << row.name;
+        EXPECT_EQ(length, row.moved) << row.name;
+    }
+}
+
+TEST_F(CUsbIoTest, ControlsOfSeveralThreadsRunOneAtATime) {
+    CUsbIo device;
+    ASSERT_EQ(Open(device), Status::Success);
+    constexpr int Each = 5;
+    for (int i = 0; i < 2 * Each; ++i) {
+        driver.ScriptControl(Control::UnconfigureDevice, {.after = 2});
+    }
+    const auto work = [](void* argument) -> std::uint32_t {
+        for (int i = 0; i < Each; ++i) {
+            EXPECT_EQ(static_cast<CUsbIo*>(argument)->UnconfigureDevice(), 0U);
+        }
+        return 0;
+    };
+    const Platform::OwnedHandle other(Platform::StartThread(work, &device));
+    work(&device);
+    EXPECT_EQ(Platform::Wait(other.Get(), 10000), Platform::WaitResult::Signalled);
+    EXPECT_EQ(driver.MostControlsAtOnce(), 1U);
+}
+
+}  // namespace
+}  // namespace Varnholt::UsbIo

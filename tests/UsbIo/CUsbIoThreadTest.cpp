@@ -1,0 +1,269 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <atomic>
+#include <functional>
+#include <mutex>
+#include <vector>
+
+#include "Platform/Time.h"
+#include "Protocol/Instrument.h"
+#include "Support/ScriptedUsbIo.h"
+#include "UsbIo/CUsbIoReader.h"
+#include "UsbIo/CUsbIoWriter.h"
+#include "UsbIo/ScopedDeviceList.h"
+
+namespace Varnholt::UsbIo {
+namespace {
+
+using namespace Protocol::UsbIoDriver;
+using Protocol::BulkInEndpoint;
+using Protocol::BulkOutEndpoint;
+using testing::ElementsAre;
+using testing::ElementsAreArray;
+using testing::IsEmpty;
+using Tests::ScriptedUsbIo;
+
+constexpr std::uint32_t Never = Tests::UsbIoAnswer::Never;
+constexpr std::uint32_t Limit = 10000;
+
+/// Collects what it reads; tells when its thread is through.
+class Reader final : public CUsbIoReader {
+  public:
+    bool WaitForExit() { return Platform::Wait(exited.Get(), Limit) == Platform::WaitResult::Signalled; }
+    std::vector<std::uint8_t> Received() {
+        const std::lock_guard held(lock);
+        return received;
+    }
+    std::vector<std::uint32_t> Errors() {
+        const std::lock_guard held(lock);
+        return errors;
+    }
+    std::uint32_t FreeBufferCount() { return BufferPool.CurrentCount(); }
+
+    std::uint32_t readsWanted = 0xFFFFFFFF;  ///< then `OperationFinished`
+    std::function<void()> onCompleted;
+
+  private:
+    void PrepareBuffer(CUsbIoBuffer& buffer) override {
+        CUsbIoReader::PrepareBuffer(buffer);
+        buffer.OperationFinished = readsWanted == 0;
+        readsWanted -= readsWanted > 0;
+    }
+    void OnBufferCompleted(CUsbIoBuffer& buffer) override {
+        {
+            const std::lock_guard held(lock);
+            const auto* const bytes = static_cast<const std::uint8_t*>(buffer.Buffer);
+            received.insert(received.end(), bytes, bytes + buffer.BytesTransferred);
+            EXPECT_TRUE(std::all_of(bytes + buffer.BytesTransferred, bytes + buffer.Size,
+                                    [](std::uint8_t byte) { return byte == 0; }));
+        }
+        if (onCompleted) {
+            onCompleted();
+        }
+    }
+    void OnBufferError(CUsbIoBuffer& buffer) override {
+        const std::lock_guard held(lock);
+        errors.push_back(buffer.Status);
+    }
+    void OnThreadExit() override { Platform::SignalEvent(exited.Get()); }
+
+    Platform::OwnedHandle exited{Platform::MakeAutoResetEvent()};
+    std::mutex lock;
+    std::vector<std::uint8_t> received;
+    std::vector<std::uint32_t> errors;
+};
+
+/// Sends the numbers from 1 on, one for each buffer.
+class Writer final : public CUsbIoWriter {
+  public:
+    bool WaitForExit() { return Platform::Wait(exited.Get(), Limit) == Platform::WaitResult::Signalled; }
+
+    std::uint8_t writesWanted = 0;
+    std::atomic<int> completed = 0;
+
+  private:
+    void PrepareBuffer(CUsbIoBuffer& buffer) override {
+        CUsbIoWriter::PrepareBuffer(buffer);
+        buffer.NumberOfBytesToTransfer = 1;
+        buffer.OperationFinished = sent == writesWanted;
+        *static_cast<std::uint8_t*>(buffer.Buffer) = ++sent;
+    }
+    void OnBufferCompleted(CUsbIoBuffer&) override { ++completed; }
+    void OnThreadExit() override { Platform::SignalEvent(exited.Get()); }
+
+    Platform::OwnedHandle exited{Platform::MakeAutoResetEvent()};
+    std::uint8_t sent = 0;
+};
+
+class CUsbIoThreadTest : public testing::Test {
+  protected:
+    template <class Stream>
+    void Bind(Stream& stream, std::uint8_t endpoint) {
+        const ScopedDeviceList list(InterfaceClass);
+        ASSERT_EQ(stream.Bind(0, endpoint, list.Get(), &InterfaceClass), Status::Success);
+        driver.TakeTranscript();
+    }
+
+    ScriptedUsbIo driver;
+    Platform::ScopedDeviceFiles files{driver};
+};
+
+TEST_F(CUsbIoThreadTest, ReadsAStreamInOrder) {
+    Reader reader;
+    Bind(reader, BulkInEndpoint);
+    std::vector<std::uint8_t> expected;
+    for (std::uint8_t i = 0; i < 10; ++i) {
+        driver.Script(BulkInEndpoint, {.data = {i, 0x80}, .after = i % 3U * 2U});
+        expected.insert(expected.end(), {i, 0x80});
+    }
+    reader.readsWanted = 10;
+    ASSERT_TRUE(reader.AllocateBuffers(8, 3));
+    ASSERT_TRUE(reader.StartThread());
+    EXPECT_FALSE(reader.StartThread());
+    EXPECT_TRUE(reader.WaitForExit());
+    EXPECT_THAT(reader.Received(), ElementsAreArray(expected));
+    EXPECT_TRUE(reader.ShutdownThread());
+    EXPECT_EQ(reader.FreeBufferCount(), 3U);
+}
+
+TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
+    Reader reader;
+    Bind(reader, BulkInEndpoint);
+    driver.Script(BulkInEndpoint, {.data = {1}, .after = 1});
+    ASSERT_TRUE(reader.AllocateBuffers(8, 4));
+    const Platform::OwnedHandle completed(Platform::MakeAutoResetEvent());
+    reader.onCompleted = [&] { Platform::SignalEvent(completed.Get()); };
+    ASSERT_TRUE(reader.StartThread());
+    ASSERT_EQ(Platform::Wait(completed.Get(), Limit), Platform::WaitResult::Signalled);
+    while (driver.Running(BulkInEndpoint) < 4) {
+        Platform::SleepMilliseconds(1);
+    }
+    reader.onCompleted = {};
+    const std::uint32_t before = Platform::TickCount();
+    EXPECT_TRUE(reader.ShutdownThread());
+    EXPECT_LT(Platform::TickCount() - before, 500U);
+    EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+    EXPECT_EQ(reader.FreeBufferCount(), 4U);
+    EXPECT_TRUE(reader.ShutdownThread());
+}
+
+TEST_F(CUsbIoThreadTest, EndsAfterTooManyErrorsInARow) {
+    struct Case {
+        const char* name;
+        std::vector<std::uint32_t> statuses;  ///< of the reads; then silence
+        std::vector<std::uint32_t> errors;    ///< seen before the thread ends
+    };
+    constexpr std::uint32_t Bad = Status::EndpointHalted;
+    constexpr std::uint32_t Down = Status::DevicePoweredDown;
+    const std::vector<Case> cases{
+        {"at once", {Bad, Bad, Bad}, {Bad, Bad, Bad}},
+        {"a good one starts anew", {Bad, Bad, 0, Bad, Bad, Bad}, {Bad, Bad, Bad, Bad, Bad}},
+        {"powered down does not count",
+         {Down, Down, Down, Down, Bad, Bad, Bad},
+         {Down, Down, Down, Down, Bad, Bad, Bad}},
+    };
+    for (const Case& row : cases) {
+        Reader reader;
+        Bind(reader, BulkInEndpoint);
+        for (const std::uint32_t status : row.statuses) {
+            driver.Script(BulkInEndpoint, {.code = status, .after = 1});
+        }
+        ASSERT_TRUE(reader.AllocateBuffers(8, 1));
+        ASSERT_TRUE(reader.StartThread(2));
+        EXPECT_TRUE(reader.WaitForExit()) << row.name;
+        EXPECT_EQ(reader.Errors(), row.errors) << row.name;
+        EXPECT_TRUE(reader.ShutdownThread());
+    }
+}
+
+TEST_F(CUsbIoThreadTest, AReadStartedBehindTheAbortDoesNotHoldUpTheEnd) {
+    Reader reader;
+    Bind(reader, BulkInEndpoint);
+    const Platform::OwnedHandle started(Platform::MakeAutoResetEvent());
+    const Platform::OwnedHandle aborted(Platform::MakeAutoResetEvent());
+    driver.Script(BulkInEndpoint, {.after = Never, .onStart = [&] {
+                                       Platform::SignalEvent(started.Get());
+                                       Platform::Wait(aborted.Get(), Limit);
+                                       Platform::SleepMilliseconds(20);
+                                   }});
+    driver.ScriptControl(Control::AbortPipe, {.onStart = [&] { Platform::SignalEvent(aborted.Get()); }});
+    ASSERT_TRUE(reader.AllocateBuffers(8, 2));
+    ASSERT_TRUE(reader.StartThread());
+    ASSERT_EQ(Platform::Wait(started.Get(), Limit), Platform::WaitResult::Signalled);
+    EXPECT_TRUE(reader.ShutdownThread());
+    EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+    EXPECT_EQ(reader.FreeBufferCount(), 2U);
+}
+
+TEST_F(CUsbIoThreadTest, TheThreadItselfCanAskForItsEnd) {
+    Reader reader;
+    Bind(reader, BulkInEndpoint);
+    driver.Script(BulkInEndpoint, {.data = {1}, .after = 1});
+    bool answer = true;
+    reader.onCompleted = [&] { answer = reader.ShutdownThread(); };
+    ASSERT_TRUE(reader.AllocateBuffers(8, 1));
+    ASSERT_TRUE(reader.StartThread());
+    EXPECT_TRUE(reader.WaitForExit());
+    EXPECT_FALSE(answer);
+    EXPECT_TRUE(reader.ShutdownThread());
+}
+
+TEST_F(CUsbIoThreadTest, SomethingThrownEndsTheThread) {
+    Reader reader;
+    Bind(reader, BulkInEndpoint);
+    driver.Script(BulkInEndpoint, {.data = {1}, .after = 1});
+    reader.onCompleted = [] { throw 7; };
+    ASSERT_TRUE(reader.AllocateBuffers(8, 3));
+    ASSERT_TRUE(reader.StartThread());
+    while (reader.Received().empty() || driver.Running(BulkInEndpoint) > 0) {
+        Platform::SleepMilliseconds(1);
+    }
+    EXPECT_TRUE(reader.ShutdownThread());
+}
+
+TEST_F(CUsbIoThreadTest, AThreadThatEndedByItselfCanBeStartedAgain) {
+    Reader reader;  // without buffers there is nothing to read
+    for (int i = 0; i < 20; ++i) {
+        ASSERT_TRUE(reader.StartThread());
+        ASSERT_TRUE(reader.WaitForExit());
+        ASSERT_TRUE(reader.ShutdownThread());
+    }
+    ASSERT_TRUE(reader.StartThread());
+    ASSERT_TRUE(reader.WaitForExit());
+    while (!reader.StartThread()) {  // until the first thread has let go of its handle
+        Platform::SleepMilliseconds(1);
+    }
+    EXPECT_TRUE(reader.ShutdownThread());
+}
+
+TEST_F(CUsbIoThreadTest, WritesUntilFinished) {
+    Writer writer;
+    Bind(writer, BulkOutEndpoint);
+    for (int i = 0; i < 4; ++i) {
+        driver.Script(BulkOutEndpoint, {.after = 2});
+    }
+    writer.writesWanted = 4;
+    ASSERT_TRUE(writer.AllocateBuffers(2, 3));
+    ASSERT_TRUE(writer.StartThread());
+    EXPECT_TRUE(writer.WaitForExit());
+    EXPECT_TRUE(writer.ShutdownThread());
+    EXPECT_THAT(driver.TakeTranscript(),
+                ElementsAre("write 03 01", "write 03 02", "write 03 03", "write 03 04"));
+    EXPECT_EQ(writer.completed, 0);
+    EXPECT_EQ(driver.Running(BulkOutEndpoint), 0U);
+}
+
+TEST_F(CUsbIoThreadTest, AWriterThatIsFinishedAtOnceSendsNothing) {
+    Writer writer;
+    Bind(writer, BulkOutEndpoint);
+    ASSERT_TRUE(writer.AllocateBuffers(2, 3));
+    ASSERT_TRUE(writer.StartThread());
+    EXPECT_TRUE(writer.WaitForExit());
+    EXPECT_TRUE(writer.ShutdownThread());
+    EXPECT_THAT(driver.TakeTranscript(), IsEmpty());
+}
+
+}  // namespace
+}  // namespace Varnholt::UsbIo
