@@ -1,0 +1,327 @@
+#include <algorithm>
+#include <atomic>
+#include <functional>
+
+#include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
+#include "NativeTest.h"
+#include "Platform/CallFilter.h"
+#include "Utilities/Multithreading/Mutex.h"
+#include "Utilities/Multithreading/ScopedLock.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using namespace Platform;
+using DeviceDriver::Ostra::LowLevel::PellandoUSBDevice;
+using DeviceDriver::Ostra::LowLevel::ScanRecordList;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using testing::SizeIs;
+using Varnholt::Utilities::Multithreading::Mutex;
+using Varnholt::Utilities::Multithreading::ScopedLock;
+using Lines = std::vector<std::string>;
+
+constexpr std::uint32_t Button = 20011;
+constexpr std::uint32_t Gone = 20010;
+constexpr std::uint32_t InterruptPipe = 3;
+const Answer ButtonData{.data = {1}};
+const std::string Path = "native/1";
+
+void ReadOneByte(PellandoUSBDevice& device) {
+    std::uint8_t byte = 0;
+    device.ReadData(&byte, 1, 0);
+}
+
+class NativeDevice : public NativeTest {
+  protected:
+    NativeDevice() : NativeTest(TestTime::RealForThreadSanitizer) {}
+
+    std::unique_ptr<PellandoUSBDevice> Open() {
+        auto device = std::make_unique<PellandoUSBDevice>(&listener, Path);
+        WaitUntil([this] { return IsListening(); });
+        return device;
+    }
+    RecordingListener listener;
+};
+
+TEST_F(NativeDevice, OpensItsPipesAndClosesThemInReverse) {
+    Open().reset();
+    Lines transcript = driver.TakeTranscript();
+    EXPECT_THAT(transcript,
+                ElementsAre("open native/1", "open native/1\\PIPE01", "open native/1\\PIPE02",
+                            "open native/1\\PIPE03", "read 3 [8]",
+                            "control 220009 00 00 00 00 00 00 84 00 00 00 / 00 00 00 00 00 00 00 00",
+                            "control 220011 00 02 00 00 D0 00 03 00 00 00 / 00 00 00 00 00 00 00 00",
+                            "cancel 3", "close native/1\\PIPE03", "close native/1\\PIPE02",
+                            "close native/1\\PIPE01", "close native/1"));
+}
+
+TEST_F(NativeDevice, SaysNothingOfAButtonThatWasUsed) {
+    auto device = Open();
+    driver.Complete(InterruptPipe, ButtonData);
+    WaitUntil([&] { return !listener.Codes().empty() && IsListening(); });
+    driver.TakeTranscript();
+    device.reset();
+    EXPECT_THAT(driver.TakeTransfers(), ElementsAre("cancel 3"));
+    EXPECT_THAT(listener.Codes(), ElementsAre(Button));
+}
+
+TEST_F(NativeDevice, ClosesWhateverTheUntouchedControlsMeet) {
+    for (const Answer& answer :
+         {Answer{.code = Errors::GeneralFailure}, Answer{.refusal = Errors::DeviceNotConnected},
+          Answer{.after = Never, .cancelledAfter = 7}}) {
+        auto device = Open();
+        driver.Script(0, answer);
+        driver.Script(0, answer);
+        const Stopwatch watch(clock);
+        device.reset();
+        watch.ExpectAtMost(2 * 2008u);
+        EXPECT_EQ(driver.OpenFiles(), 0u);
+        EXPECT_EQ(driver.RunningTransfers(), 0u);
+    }
+}
+
+TEST_F(NativeDevice, ThatCannotBeOpenedLeavesNothingBehind) {
+    const std::string noPipe = "could not open pipe:" + ErrorSuffix(Errors::FileNotFound);
+    const struct {
+        std::string pipe;
+        std::string text;
+    } cases[] = {{"", noPipe},
+                 {"\\PIPE01", noPipe},
+                 {"\\PIPE02", noPipe},
+                 {"\\PIPE03", "interrupt listener thread had timeout"}};
+    for (const auto& row : cases) {
+        ScriptedDriver other;
+        const ScopedDeviceFiles inForce(other);
+        other.RefuseOpen(Path + row.pipe, Errors::FileNotFound);
+        ExpectThrow<IOException>(row.text, [] { PellandoUSBDevice device(nullptr, Path); });
+        EXPECT_EQ(other.OpenFiles(), 0u);
+        EXPECT_THAT(other.TakeTransfers(), IsEmpty());
+    }
+    InstallCallFilter([](std::string_view call) {
+        return call == "StartThread" ? Errors::NoSystemResources : Errors::Success;
+    });
+    ExpectThrow<IOException>("could not create interrupt listener thread",
+                             [] { PellandoUSBDevice device(nullptr, Path); });
+    InstallCallFilter({});
+    EXPECT_EQ(driver.OpenFiles(), 0u);
+}
+
+TEST_F(NativeDevice, ClosesItsPipesWhenTheInstrumentIsGone) {
+    auto device = Open();
+    driver.TakeTranscript();
+    driver.Complete(InterruptPipe, {.code = Errors::DeviceNotConnected});
+    WaitUntil([&] { return driver.OpenFiles() == 0; });
+    EXPECT_THAT(listener.Codes(), ElementsAre(Gone));
+    EXPECT_THAT(driver.TakeTranscript(), ElementsAre("close native/1\\PIPE02", "close native/1\\PIPE01",
+                                                     "close native/1", "close native/1\\PIPE03"));
+    const std::string suffix = ErrorSuffix(Errors::InvalidHandle);
+    ExpectThrow<IOException>("read data failed" + suffix, [&] { ReadOneByte(*device); });
+    ExpectThrow<TimeoutException>("Device IO control failed " + suffix,
+                                  [&] { device->PerformDeviceIOControl({}, nullptr, 0); });
+    ScanRecordList records;
+    ExpectThrow<IOException>("Read data failed (OverlappedRead)",
+                             [&] { device->ReadDataStrip(records, 5, 0); });
+    device.reset();
+    EXPECT_THAT(driver.TakeTranscript(), IsEmpty());
+}
+
+TEST_F(NativeDevice, KeepsItsPipesOpenWithoutAListener) {
+    for (const bool isRemoved : {false, true}) {
+        PellandoUSBDevice device(isRemoved ? &listener : nullptr, Path);
+        if (isRemoved) {
+            device.RemoveListener(nullptr);  // whichever it is
+        }
+        device.MessageFromDevice(Gone, 0);
+        driver.Script(1, {.data = {7}});
+        EXPECT_NO_THROW(ReadOneByte(device));
+    }
+    EXPECT_THAT(listener.Codes(), IsEmpty());
+}
+
+TEST_F(NativeDevice, PassesMessagesOn) {
+    auto device = Open();
+    device->MessageFromDevice(4711, 0);
+    EXPECT_THAT(listener.Codes(), ElementsAre(4711u));
+    driver.Script(1, {.data = {7}});
+    EXPECT_NO_THROW(ReadOneByte(*device)) << "only the end of the instrument closes its pipes";
+}
+
+/// Whoever holds the mutex named after the path keeps every transfer of every device of that path waiting.
+TEST_F(NativeDevice, TakesTheDeviceLockForEveryTransfer) {
+    auto device = Open();
+    ScanRecordList records;
+    std::uint8_t byte = 0;
+    const std::function<void()> operations[] = {
+        [&] { device->PerformDeviceIOControl({}, nullptr, 0); },
+        [&] { ReadOneByte(*device); },
+        [&] { device->WriteData(&byte, 1, 0); },
+        [&] { device->ReadDataStrip(records, 1, 0); },
+        [&] { device->ReadDataCountedStrip(records, 1, 0, 1); },
+        [&] { device->MessageFromDevice(Button, 0); },
+        [&] { device->RemoveListener(&listener); },
+    };
+    for (const auto& operation : operations) {
+        driver.Script(1, {.data = {7}});
+        Mutex mutex("native1");
+        mutex.Lock();
+        BackgroundThread other(operation);
+        SleepMilliseconds(100);
+        EXPECT_FALSE(other.HasEnded());
+        mutex.Unlock();
+        SleepMilliseconds(100);
+        EXPECT_TRUE(other.HasEnded());
+    }
+}
+
+TEST_F(NativeDevice, HoldsTheDeviceLockThroughAStrip) {
+    auto device = Open();
+    driver.Script(1, {.data = Counting(10, 1), .after = 50});
+    driver.Script(1, {.after = 100});
+    BackgroundThread scan([&] {
+        ScanRecordList records;
+        device->ReadDataStrip(records, 5, 0);
+        EXPECT_THAT(records, SizeIs(2));
+    });
+    SleepMilliseconds(10);
+    Mutex mutex("native1");
+    EXPECT_FALSE(mutex.TryLock(80));
+    EXPECT_TRUE(mutex.TryLock(20));
+    mutex.Unlock();
+}
+
+// RemoveListener against a message under way. With the two locks taken in different orders these would never
+// end.
+
+TEST_F(NativeDevice, RemovesAListenerWhoseMessageWaitsForTheDeviceLock) {
+    auto device = Open();
+    {
+        Mutex mutex("native1");
+        const ScopedLock held(mutex);
+        driver.Complete(InterruptPipe, ButtonData);
+        SleepMilliseconds(10);  // the message waits for the lock
+        device->RemoveListener(&listener);
+    }
+    SleepMilliseconds(10);
+    EXPECT_THAT(listener.Codes(), IsEmpty());
+    driver.Complete(InterruptPipe, ButtonData);
+    SleepMilliseconds(10);
+    EXPECT_THAT(listener.Codes(), IsEmpty());
+}
+
+TEST_F(NativeDevice, RemovesAListenerOnlyAfterTheMessageUnderWay) {
+    auto device = Open();
+    std::atomic<bool> isInside = false;
+    listener.onMessage = [&](std::uint32_t) {
+        isInside = true;
+        SleepMilliseconds(50);
+        isInside = false;
+    };
+    driver.Complete(InterruptPipe, ButtonData);
+    WaitUntil([&] { return isInside.load(); });
+    device->RemoveListener(&listener);
+    EXPECT_FALSE(isInside);
+    EXPECT_THAT(listener.Codes(), ElementsAre(Button));
+}
+
+TEST_F(NativeDevice, RemovesAListenerFromInsideItsMessage) {
+    auto device = Open();
+    listener.onMessage = [&](std::uint32_t) { device->RemoveListener(&listener); };
+    for (int i = 0; i < 2; ++i) {
+        WaitUntil([&] { return driver.Complete(InterruptPipe, ButtonData); });
+    }
+    WaitUntil([&] { return IsListening(); });
+    EXPECT_THAT(listener.Codes(), ElementsAre(Button));
+    device.reset();
+    EXPECT_EQ(driver.OpenFiles(), 0u);
+}
+
+TEST_F(NativeDevice, MayBeUsedAndClosedFromInsideAMessage) {
+    for (const std::uint32_t code : {Button, Gone}) {
+        auto device = Open();
+        std::atomic<bool> hasReturned = false;
+        listener.onMessage = [&](std::uint32_t received) {
+            EXPECT_EQ(received, code);
+            driver.Script(1, {.data = {7}});
+            EXPECT_NO_THROW(ReadOneByte(*device));
+            const Stopwatch watch(clock);
+            device.reset();
+            watch.ExpectAtMost(2u);
+            hasReturned = true;
+        };
+        driver.Complete(InterruptPipe, code == Button ? ButtonData : Answer{});
+        WaitUntil([&] { return hasReturned.load() && driver.OpenFiles() == 0; });
+        EXPECT_EQ(device, nullptr);
+    }
+    EXPECT_THAT(listener.Codes(), ElementsAre(Button, Gone));
+}
+
+/// Closing is bounded even if somebody holds the device lock and the listener's thread waits for it; that
+/// thread then finds everything it touches in place, and its message is dropped.
+TEST_F(NativeDevice, ClosesInTimeWhileAMessageWaitsForTheDeviceLock) {
+    const OwnedHandle release(MakeAutoResetEvent());
+    std::atomic<bool> isHeld = false;
+    auto device = Open();
+    BackgroundThread holder([&] {
+        Mutex mutex("native1");
+        const ScopedLock held(mutex);
+        isHeld = true;
+        Wait(release.Get(), Infinite);
+    });
+    WaitUntil([&] { return isHeld.load(); });
+    driver.Complete(InterruptPipe, ButtonData);
+    SleepMilliseconds(10);  // the message waits for the lock
+    const Stopwatch watch(clock);
+    device.reset();
+    watch.ExpectAtMost(11'000u);
+    EXPECT_EQ(driver.OpenFiles(), 0u);
+    SignalEvent(release.Get());
+    holder.Join();
+    SleepMilliseconds(10);
+    EXPECT_THAT(listener.Codes(), IsEmpty());
+}
+
+TEST(NativeDeviceList, NamesThePathsInOrderUpTo127) {
+    const TestClock clock(TestTime::Virtual);
+    for (const std::size_t count : {0u, 1u, 3u, 127u, 130u}) {
+        Lines paths;
+        for (std::size_t i = 0; i < count; ++i) {
+            paths.push_back("native/" + std::to_string(i));
+        }
+        ScriptedDriver driver(paths);
+        const ScopedDeviceFiles files(driver);
+        EXPECT_EQ(PellandoUSBDevice::ScanDevice(static_cast<std::uint16_t>(count)), "");
+        EXPECT_EQ(PellandoUSBDevice::ScanDevice(0xFFFF), "");
+        if (count > 2) {
+            EXPECT_EQ(PellandoUSBDevice::ScanDevice(2), "native/2");
+        }
+        paths.resize(std::min<std::size_t>(count, 127));
+        EXPECT_EQ(PellandoUSBDevice::GetAllDevices(), paths);
+    }
+}
+
+TEST(NativeDeviceList, IsEmptyWhenThePlatformCannotTell) {
+    const TestClock clock(TestTime::Virtual);
+    ScriptedDriver driver;
+    const ScopedDeviceFiles files(driver);
+    for (const char* call : {"MakeList", "LoadEnumeration", "FindInterface", "DetailSize", "ReadDetail"}) {
+        SCOPED_TRACE(call);
+        bool wasAsked = false;
+        InstallCallFilter([&](std::string_view name) {
+            wasAsked = wasAsked || name == call;
+            return name == call ? Errors::InvalidData : Errors::Success;
+        });
+        EXPECT_THAT(PellandoUSBDevice::GetAllDevices(), IsEmpty());
+        InstallCallFilter({});
+        EXPECT_TRUE(wasAsked);
+    }
+}
+
+TEST(NativeDeviceName, KeepsLettersAndDigits) {
+    EXPECT_EQ(PellandoUSBDevice::StripStrangeChars("\\\\?\\usb#Vid_04b4&pid_1004#5&2a#{00873FDF-61A8}.\xC4z"),
+              "usbVid04b4pid100452a00873FDF61A8z");
+    EXPECT_EQ(PellandoUSBDevice::StripStrangeChars("\\?#&{}-_./@[`~ "), "");
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests

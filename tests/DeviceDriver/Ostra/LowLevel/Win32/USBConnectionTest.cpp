@@ -1,0 +1,331 @@
+#include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
+#include "NativeTest.h"
+#include "Platform/CallFilter.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using namespace Platform;
+using DeviceDriver::Ostra::LowLevel::USBConnection;
+using Protocol::NativeDriver::ControlBlock;
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+constexpr ControlBlock OutwardBlock{0, 2, 0, 0, 0xCA, 0, 0, 0, 0, 0};
+constexpr std::uint32_t Control = Protocol::NativeDriver::ControlVendorRequest;
+
+class UsbConnection : public NativeTest {};
+
+TEST_F(UsbConnection, OpensThePathForPipe0AndAPipeBelowItForTheOthers) {
+    for (const std::uint32_t pipe : {0u, 1u, 2u, 3u}) {
+        const USBConnection connection("native/1", pipe, NoHandle);
+    }
+    EXPECT_THAT(driver.TakeTranscript(),
+                ElementsAre("open native/1", "close native/1", "open native/1\\PIPE01",
+                            "close native/1\\PIPE01", "open native/1\\PIPE02", "close native/1\\PIPE02",
+                            "open native/1\\PIPE03", "close native/1\\PIPE03"));
+}
+
+TEST_F(UsbConnection, ThatCannotBeMadeLeavesNothingOpen) {
+    driver.RefuseOpen("native/1\\PIPE01", Errors::AccessDenied);
+    ExpectThrow<IOException>("could not open pipe:" + ErrorSuffix(Errors::AccessDenied),
+                             [] { const USBConnection connection("native/1", 1, NoHandle); });
+
+    InstallCallFilter([](std::string_view call) {
+        return call == "MakeAutoResetEvent" ? Errors::NoSystemResources : Errors::Success;
+    });
+    ExpectThrow<IOException>("could not create pipe-event-handle",
+                             [] { const USBConnection connection("native/1", 2, NoHandle); });
+    InstallCallFilter({});
+    EXPECT_EQ(driver.OpenFiles(), 0u);
+}
+
+void Read64(USBConnection& connection) {
+    const auto buffer = std::make_unique<std::uint8_t[]>(64);
+    connection.Read(buffer.get(), 64, 64);
+}
+
+void Write64(USBConnection& connection) {
+    const auto buffer = std::make_unique<std::uint8_t[]>(64);
+    connection.Write(buffer.get(), 64, 640);
+}
+
+void SendControl(USBConnection& connection) {
+    const auto data = std::make_unique<std::uint8_t[]>(8);
+    connection.PerformDeviceIOControl(OutwardBlock, Control, data.get(), 8, true);
+}
+
+void AskControl(USBConnection& connection) {
+    ControlBlock block = OutwardBlock;
+    block[Protocol::NativeDriver::Block::Direction] = 1;
+    const auto data = std::make_unique<std::uint8_t[]>(8);
+    connection.PerformDeviceIOControl(block, Control, data.get(), 8, true);
+}
+
+struct TransferCase {
+    const char* name;
+    void (*operation)(USBConnection&);
+    Answer answer;
+    std::uint64_t milliseconds;  ///< until the operation returns
+    std::string text;            ///< without the error's; empty: succeeds
+    ErrorCode code = Errors::Success;
+    bool isTimeout = false;
+};
+
+/// Each buffer dies with its operation: a transfer that outlived it would write into freed memory.
+TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
+    const ErrorCode stall = Errors::GeneralFailure;
+    const ErrorCode gone = Errors::DeviceNotConnected;
+    const TransferCase cases[] = {
+        {"control", SendControl, {}, 1, "", {}},
+        {"control, answered", AskControl, {.data = Counting(8, 1)}, 1, "", {}},
+        {"control, shorter than asked", AskControl, {.data = Counting(3, 1)}, 1, "", {}},
+        {"control, in the last moment", AskControl, {.data = Counting(8, 1), .after = 1999}, 2000, "", {}},
+        {"control, stalled",
+         SendControl,
+         {.code = stall, .after = 5},
+         6,
+         "Device IO control failed: ",
+         stall},
+        {"control, at once without the device",
+         SendControl,
+         {.code = gone},
+         1,
+         "Device IO control failed: ",
+         gone},
+        {"control, silent",
+         AskControl,
+         {.after = Never},
+         2001,
+         "Device IO control failed ",
+         Errors::IoPending,
+         true},
+        {"control, too late and cancelled slowly with data",
+         AskControl,
+         {.data = Counting(8, 1), .after = Never, .cancelledAfter = 40, .cancelledWithData = true},
+         2041,
+         "Device IO control failed ",
+         Errors::IoPending,
+         true},
+        {"control, not started",
+         SendControl,
+         {.refusal = gone},
+         2001,
+         "Device IO control failed ",
+         gone,
+         true},
+        {"control, wait impossible",
+         SendControl,
+         {.after = Never, .completesThrough = NamesNothing()},
+         1,
+         "Device IO control failed ",
+         Errors::InvalidHandle,
+         true},
+
+        {"read", Read64, {.data = Counting(64, 1), .after = 10}, 10, "", {}},
+        {"read, in the last moment", Read64, {.data = Counting(64, 1), .after = 5063}, 5063, "", {}},
+        {"read, silent", Read64, {.after = Never}, 5064, "read data failed", Errors::IoIncomplete},
+        {"read, silent and cancelled slowly with data",
+         Read64,
+         {.data = Counting(64, 1),
+          .after = Never,
+          .cancelledAfter = 40,
+          .cancelledWith = Errors::Success,
+          .cancelledWithData = true},
+         5104,
+         "read data failed",
+         Errors::IoIncomplete},
+        {"read, stalled", Read64, {.code = stall, .after = 7}, 7, "read data failed", stall},
+        {"read, stalled behind all data",
+         Read64,
+         {.data = Counting(64, 1), .code = stall, .after = 7},
+         7,
+         "read data failed",
+         stall},
+        {"read, not started", Read64, {.refusal = gone}, 5064, "read data failed", gone},
+        {"read, wait impossible",
+         Read64,
+         {.after = Never, .completesThrough = NamesNothing()},
+         0,
+         "read data failed",
+         Errors::IoIncomplete},
+        {"read, short", Read64, {.data = Counting(60, 1)}, 0, "read data failed (Not enough data)"},
+        {"read, empty", Read64, {}, 0, "read data failed (Not enough data)"},
+        {"read, longer",
+         Read64,
+         {.data = Counting(64, 1), .count = 65},
+         0,
+         "read data failed (Not enough data)"},
+
+        {"write", Write64, {.after = 10}, 10, "", {}},
+        {"write, silent", Write64, {.after = Never}, 5640, "write data failed", Errors::IoIncomplete},
+        {"write, stalled", Write64, {.code = stall, .after = 7}, 7, "write data failed", stall},
+        {"write, short", Write64, {.count = 63}, 0, "write data failed (Not enough data)"},
+    };
+    for (const TransferCase& row : cases) {
+        SCOPED_TRACE(row.name);
+        const bool isWrite = row.operation == Write64;
+        const std::uint32_t pipe = row.operation == Read64 ? 1 : isWrite ? 2 : 0;
+        USBConnection connection("native/1", pipe, NoHandle);
+        driver.Script(pipe, row.answer);
+        const Stopwatch watch(clock);
+        const auto operation = [&] { row.operation(connection); };
+        const std::string text = row.code ? row.text + ErrorSuffix(row.code) : row.text;
+        if (text.empty()) {
+            EXPECT_NO_THROW(operation());
+        } else if (row.isTimeout) {
+            ExpectThrow<TimeoutException>(text, operation);
+        } else {
+            ExpectThrow<IOException>(text, operation);
+        }
+        watch.Expect(row.milliseconds);
+        EXPECT_EQ(driver.RunningTransfers(), 0u);
+    }
+}
+
+TEST_F(UsbConnection, ReportsAnAbandonedWait) {
+    const struct {
+        void (*operation)(USBConnection&);
+        std::uint32_t pipe;
+        const char* text;
+    } cases[] = {{SendControl, 0, "Device IO control failed "},
+                 {Read64, 1, "read data failed (wait abandoned)"},
+                 {Write64, 2, "write data failed (wait abandoned)"}};
+    for (const auto& row : cases) {
+        SCOPED_TRACE(row.text);
+        const AbandonedMutex abandoned;
+        USBConnection connection("native/1", row.pipe, NoHandle);
+        driver.Script(row.pipe, {.after = Never, .completesThrough = abandoned.Get()});
+        ExpectThrow<TimeoutException>(row.text + ErrorSuffix(Errors::IoPending),
+                                      [&] { row.operation(connection); });
+        EXPECT_EQ(driver.RunningTransfers(), 0u);
+        ReleaseMutex(abandoned.Get());
+    }
+}
+
+TEST_F(UsbConnection, MovesTheBytes) {
+    USBConnection control("native/1", 0, NoHandle);
+    ControlBlock inward = OutwardBlock;
+    inward[Protocol::NativeDriver::Block::Direction] = 1;
+    Bytes data = Counting(4, 0x11);
+    control.PerformDeviceIOControl(OutwardBlock, 0x220009, data.data(), 4, true);
+    driver.Script(0, {.data = {0xA0, 0xA1}});
+    control.PerformDeviceIOControl(inward, Control, data.data(), 4, true);
+    EXPECT_THAT(data, ElementsAre(0xA0, 0xA1, 0x13, 0x14));
+
+    USBConnection reader("native/1", 1, NoHandle);
+    driver.Script(1, {.data = Counting(4, 0x21)});
+    reader.Read(data.data(), 4, 0);
+    EXPECT_EQ(data, Counting(4, 0x21));
+
+    USBConnection writer("native/1", 2, NoHandle);
+    writer.Write(data.data(), 3, 0);
+    EXPECT_THAT(
+        driver.TakeTransfers(),
+        ElementsAre("control 220009 00 02 00 00 CA 00 00 00 00 00 / 11 12 13 14",
+                    "control 22000D 01 02 00 00 CA 00 00 00 00 00 / [4]", "read 1 [4]", "write 2 21 22 23"));
+}
+
+TEST_F(UsbConnection, ReportsNothingWhenToldSo) {
+    USBConnection connection("native/1", 0, NoHandle);
+    std::uint8_t data[8] = {};
+    const auto send = [&] { connection.PerformDeviceIOControl(OutwardBlock, Control, data, 8, false); };
+    const struct {
+        Answer answer;
+        std::uint64_t milliseconds;
+    } cases[] = {{{.code = Errors::DeviceNotConnected}, 1},
+                 {{.refusal = Errors::DeviceNotConnected}, 2001},
+                 {{.after = Never, .cancelledAfter = 10}, 2011}};
+    for (const auto& row : cases) {
+        const Stopwatch watch(clock);
+        driver.Script(0, row.answer);
+        EXPECT_NO_THROW(send());
+        watch.Expect(row.milliseconds);
+        EXPECT_EQ(driver.RunningTransfers(), 0u);
+    }
+    connection.Close();
+    EXPECT_NO_THROW(send());
+}
+
+TEST_F(UsbConnection, WaitsWithAnEndHoweverLongTheTimeout) {
+    if (!clock.IsVirtual()) {
+        GTEST_SKIP() << "takes weeks in real time";
+    }
+    USBConnection connection("native/1", 1, NoHandle);
+    for (const std::uint32_t timeout : {0xFFFFFFFFu, 0xFFFFFFFFu - 4999, 0xFFFFFFFFu - 5000}) {
+        const Stopwatch watch(clock);
+        std::uint8_t byte = 0;
+        ExpectThrow<IOException>("read data failed" + ErrorSuffix(Errors::IoIncomplete),
+                                 [&] { connection.Read(&byte, 1, timeout); });
+        watch.Expect(0xFFFFFFFEu);
+    }
+}
+
+TEST_F(UsbConnection, ClosesOnceAndFailsAfterwards) {
+    const OwnedHandle event(MakeAutoResetEvent());
+    {
+        USBConnection given("native/1", 3, event.Get());
+        given.Close();
+        given.Close();
+    }
+    EXPECT_TRUE(SignalEvent(event.Get()));
+
+    USBConnection own("native/1", 1, NoHandle);
+    const Handle ownEvent = own.CompletionEvent();
+    driver.TakeTranscript();
+    own.Close();
+    own.Close();
+    EXPECT_THAT(driver.TakeTranscript(), ElementsAre("close native/1\\PIPE01"));
+    EXPECT_FALSE(SignalEvent(ownEvent));
+
+    const std::string suffix = ErrorSuffix(Errors::InvalidHandle);
+    ExpectThrow<IOException>("read data failed" + suffix, [&] { Read64(own); });
+    ExpectThrow<IOException>("write data failed" + suffix, [&] { Write64(own); });
+    ExpectThrow<TimeoutException>("Device IO control failed " + suffix, [&] { SendControl(own); });
+    std::vector<std::uint8_t> buffer(8);
+    EXPECT_EQ(own.Read(buffer), 0u);
+}
+
+class UsbConnectionVectorRead : public NativeTest {
+  protected:
+    std::uint32_t Read(Answer answer) {
+        driver.Script(3, std::move(answer));
+        return connection.Read(buffer);
+    }
+
+    OwnedHandle event{MakeAutoResetEvent()};
+    USBConnection connection{"native/1", 3, event.Get()};
+    std::vector<std::uint8_t> buffer = Bytes(8);
+};
+
+TEST_F(UsbConnectionVectorRead, GivesWhatCame) {
+    EXPECT_EQ(Read({.data = Counting(3, 1), .after = 100'000}), 3u);
+    EXPECT_THAT(buffer, ElementsAre(1, 2, 3, 0, 0, 0, 0, 0));
+    EXPECT_EQ(Read({.data = Counting(9, 1), .after = 1}), 8u);
+    EXPECT_EQ(Read({.after = 5}), 0u);
+    EXPECT_EQ(Read({.code = Errors::DeviceNotConnected, .after = 5}), 0u);
+    EXPECT_EQ(Read({.refusal = Errors::AccessDenied}), 0u);
+    EXPECT_EQ(Read({.refusal = Errors::DeviceNotConnected}), 0u) << "or it would wait for ever";
+}
+
+TEST_F(UsbConnectionVectorRead, EndsWhenSomebodySignalsItsEvent) {
+    const auto signal = [this] { SignalEvent(event.Get()); };
+    ClockScheduler().CallAt(ClockScheduler().Now() + 1000, signal);
+    EXPECT_EQ(Read({.after = Never}), 0u);
+    EXPECT_EQ(driver.RunningTransfers(), 0u);
+
+    ClockScheduler().CallAt(ClockScheduler().Now() + 1000, signal);
+    EXPECT_EQ(Read({.data = Counting(2, 1), .after = Never, .cancelledAfter = 3, .cancelledWithData = true}),
+              2u)
+        << "data that arrive during the cancellation count";
+    EXPECT_THAT(driver.TakeTransfers(), ElementsAre("read 3 [8]", "cancel 3", "read 3 [8]", "cancel 3"));
+}
+
+TEST_F(UsbConnectionVectorRead, FailsWhenTheWaitDoes) {
+    ExpectThrow<IOException>("wait failed",
+                             [&] { Read({.after = Never, .completesThrough = NamesNothing()}); });
+    EXPECT_EQ(driver.RunningTransfers(), 0u);
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests

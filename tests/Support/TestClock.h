@@ -1,0 +1,67 @@
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <optional>
+
+#include "Platform/EventScheduler.h"
+#if !defined(_WIN32)
+#include "Platform/VirtualClock.h"
+#endif
+
+namespace Varnholt::Tests {
+
+/// What a ThreadSanitizer build does with a test's time: threads that take turns, as virtual time has them,
+/// hide their races.
+enum class TestTime { Virtual, RealForThreadSanitizer };
+
+/// The time of a test: virtual where it can be, real otherwise.
+class TestClock final {
+  public:
+    explicit TestClock([[maybe_unused]] TestTime time) {
+#if !defined(_WIN32)
+#if defined(__SANITIZE_THREAD__)
+        if (time == TestTime::RealForThreadSanitizer) {
+            return;
+        }
+#endif
+        clock.emplace(1);
+#endif
+    }
+
+#if defined(_WIN32)
+    bool IsVirtual() const {
+        return false;
+    }
+#else
+    bool IsVirtual() const {
+        return clock.has_value();
+    }
+
+  private:
+    std::optional<Platform::VirtualClock> clock;
+#endif
+};
+
+/// Milliseconds since it was made, of the time in force.
+class Stopwatch final {
+  public:
+    explicit Stopwatch(const TestClock& clock) : isExact(clock.IsVirtual()) {}
+
+    std::uint64_t Milliseconds() const { return (Platform::ClockScheduler().Now() - begin) / 1000; }
+    /// Exactly so long in virtual time; not much longer in real time.
+    void Expect(std::uint64_t milliseconds) const { ExpectBetween(milliseconds, milliseconds); }
+    void ExpectAtMost(std::uint64_t milliseconds) const { ExpectBetween(0, milliseconds); }
+    void ExpectBetween(std::uint64_t least, std::uint64_t most) const {
+        const std::uint64_t elapsed = Milliseconds();
+        EXPECT_GE(elapsed + (isExact ? 0 : 1), least);
+        EXPECT_LE(elapsed, most + (isExact ? 0 : 2000));
+    }
+
+  private:
+    const bool isExact;
+    const std::uint64_t begin = Platform::ClockScheduler().Now();
+};
+
+}  // namespace Varnholt::Tests
