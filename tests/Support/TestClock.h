@@ -16,7 +16,9 @@ namespace Varnholt::Tests {
 /// hide their races.
 enum class TestTime { Virtual, RealForThreadSanitizer };
 
-/// The time of a test: virtual where it can be, real otherwise.
+/// The time of a test: virtual where it can be, real otherwise. The order of threads is the same in every
+/// run, unless the test program is told to use others: `--gtest_shuffle --gtest_repeat=100` tries one per
+/// repetition, `--gtest_shuffle --gtest_random_seed=N` repeats one.
 class TestClock final {
   public:
     explicit TestClock([[maybe_unused]] TestTime time) {
@@ -26,7 +28,7 @@ class TestClock final {
             return;
         }
 #endif
-        clock.emplace(1);
+        clock.emplace(static_cast<std::uint64_t>(testing::UnitTest::GetInstance()->random_seed()));
 #endif
     }
 

@@ -75,7 +75,7 @@ TEST_F(NativeDevice, ClosesWhateverTheUntouchedControlsMeet) {
         driver.Script(0, answer);
         const Stopwatch watch(clock);
         device.reset();
-        watch.ExpectAtMost(2 * 2008u);
+        watch.ExpectAtMost(2 * (1 + 2000 + 7) + 1);
         EXPECT_EQ(driver.OpenFiles(), 0u);
         EXPECT_EQ(driver.RunningTransfers(), 0u);
     }

@@ -242,17 +242,17 @@ bool ScriptedDriver::Start(File* file, std::string line, std::uint8_t* target, s
         }
         return answer.code == Errors::Success;
     }
-    EndLater(number, answer.after, answer.code, true);
+    if (answer.after != Never) {
+        EndLater(number, std::uint64_t{answer.after} * 1000, answer.code, true);
+    }
     SetLastError(Errors::IoPending);
     return false;
 }
 
-void ScriptedDriver::EndLater(std::uint64_t number, std::uint32_t after, ErrorCode code, bool withData) {
-    if (after == Never) {
-        return;
-    }
+void ScriptedDriver::EndLater(std::uint64_t number, std::uint64_t microseconds, ErrorCode code,
+                              bool withData) {
     const EventScheduler::EventId event =
-        ClockScheduler().CallAt(ClockScheduler().Now() + std::uint64_t{after} * 1000,
+        ClockScheduler().CallAt(ClockScheduler().Now() + microseconds,
                                 [this, number, code, withData] { End(number, code, withData); });
     const std::lock_guard held(lock);
     events.push_back(event);
@@ -320,8 +320,10 @@ bool ScriptedDriver::CancelTransfers(Handle handle) {
         const Answer& answer = transfer.answer;
         if (answer.cancelledAfter == 0) {
             End(transfer.number, answer.cancelledWith, answer.cancelledWithData);
-        } else {
-            EndLater(transfer.number, answer.cancelledAfter, answer.cancelledWith, answer.cancelledWithData);
+        } else if (answer.cancelledAfter != Never) {
+            // Between two looks of a waiting `GetResult`.
+            EndLater(transfer.number, std::uint64_t{answer.cancelledAfter} * 1000 - 500, answer.cancelledWith,
+                     answer.cancelledWithData);
         }
     }
     return true;

@@ -101,7 +101,7 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     bool Start(File* file, std::string line, std::uint8_t* target, std::uint32_t length, const Answer& usual,
                Platform::Overlapped& record);
     void End(std::uint64_t number, Platform::ErrorCode code, bool withData);
-    void EndLater(std::uint64_t number, std::uint32_t after, Platform::ErrorCode code, bool withData);
+    void EndLater(std::uint64_t number, std::uint64_t microseconds, Platform::ErrorCode code, bool withData);
 
     const std::vector<std::string> paths;
     mutable std::mutex lock;  ///< guards what follows

@@ -89,7 +89,7 @@ TEST_F(NativeStripRead, Sizes) {
          {{.data = Counting(10, 1), .after = 3999},
           {.data = Counting(50, 11), .after = 7998},
           {.data = Counting(5, 61), .after = 7998}},
-         {"read 1 [10]", "read 1 [50]", "read 1 [50]", "read 1 [50]", "cancel 1"},
+         {"read 1 [10]", "read 1 [50]", "read 1 [50]", "read 1 [50]", "read 1 [50]", "cancel 1"},
          65,
          "",
          11997},
