@@ -7,6 +7,7 @@
 #include "Platform/Time.h"
 #include "Protocol/Instrument.h"
 #include "Support/ScriptedUsbIo.h"
+#include "TestClock.h"
 #include "UsbIo/CUsbIoPipe.h"
 #include "UsbIo/ScopedDeviceList.h"
 
@@ -31,6 +32,7 @@ class CUsbIoPipeTest : public testing::Test {
         driver.TakeTranscript();
     }
 
+    Tests::TestClock clock;
     ScriptedUsbIo driver;
     Platform::ScopedDeviceFiles files{driver};
     CUsbIoPipe pipe;

@@ -10,6 +10,7 @@
 #include "Platform/Time.h"
 #include "Protocol/Instrument.h"
 #include "Support/ScriptedUsbIo.h"
+#include "TestClock.h"
 #include "UsbIo/CUsbIoReader.h"
 #include "UsbIo/CUsbIoWriter.h"
 #include "UsbIo/ScopedDeviceList.h"
@@ -106,6 +107,7 @@ class CUsbIoThreadTest : public testing::Test {
         driver.TakeTranscript();
     }
 
+    Tests::TestClock clock;
     ScriptedUsbIo driver;
     Platform::ScopedDeviceFiles files{driver};
 };

@@ -77,6 +77,7 @@ class InterruptListener_Win64Test : public testing::Test {
         return Platform::TickCount() - before;
     }
 
+    Tests::TestClock clock;
     Tests::ScriptedUsbIo driver;
     Platform::ScopedDeviceFiles files{driver};
     Receiver receiver;

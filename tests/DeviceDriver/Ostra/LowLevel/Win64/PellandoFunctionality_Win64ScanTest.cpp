@@ -40,8 +40,10 @@ class UsbIoScanTest : public Tests::UsbIoTransportFixture {
   protected:
     UsbIoScanTest() {
         Platform::ObserveBeeps([this](std::uint32_t hertz, std::uint32_t milliseconds) {
-            const std::lock_guard held(beepLock);
-            beeps.emplace_back(hertz, milliseconds);
+            {
+                const std::lock_guard held(beepLock);
+                beeps.emplace_back(hertz, milliseconds);
+            }
             Platform::SignalEvent(beeped.Get());
         });
     }
