@@ -1,0 +1,260 @@
+// Every operation of the library, on both transports, with every fault at every transfer: the outcome is a
+// documented one, within a bounded time, and the instrument can be opened again.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <array>
+#include <cstdlib>
+#include <functional>
+#include <optional>
+#include <regex>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
+#include "FaultInjector.h"
+#include "ostra.h"
+#include "Platform/VirtualClock.h"
+#include "Protocol/Instrument.h"
+#include "Support/SimulatedHost.h"
+#include "TransferRecorder.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using DeviceDriver::Generic::Utilities::DeviceDriverException;
+using DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
+using Platform::Usb::TransferStatus;
+using Simulator::Fault;
+using Simulator::FaultKind;
+using Simulator::FaultPlan;
+using Simulator::RecordedTransfer;
+
+constexpr std::uint32_t ScanRecord = 1000;
+constexpr std::uint32_t ScanTotal = 100000;
+constexpr std::uint64_t OpenScanTotal = 155'000;
+/// Longest time-outs on the road: a transfer (15 s for a piece of the EEPROM), then a listener that is waited
+/// for.
+constexpr std::uint64_t TimeLimit = 40'000;  // ms
+
+/// What came out of one run: nothing, or the text of what failed.
+using Outcome = std::optional<std::string>;
+
+struct Operation {
+    const char* name;
+    /// Opens the instrument, does its work, closes it.
+    std::function<Outcome()> run;
+    std::uint64_t scanBytes = Protocol::ReadoutBytes;
+};
+
+/// An operation on an opened instrument; other exceptions than the documented ones end the test.
+std::function<Outcome()> OnInstrument(std::function<void(PellandoFunctionality&)> work) {
+    return [work = std::move(work)]() -> Outcome {
+        try {
+            PellandoFunctionality instrument(nullptr, 0);
+            work(instrument);
+            return std::nullopt;
+        } catch (const DeviceDriverException& exception) {
+            return std::string(exception.what());
+        }
+    };
+}
+
+void RunScan(PellandoFunctionality& instrument, std::uint32_t total) {
+    instrument.StartScan(ScanRecord, 1, total);
+    std::vector<std::uint8_t> record(ScanRecord);
+    for (std::uint32_t size = ScanRecord; size > 0;) {
+        instrument.GetScanData(record.data(), size);
+    }
+}
+
+const std::vector<std::uint8_t>& Image() {
+    static const std::vector<std::uint8_t> image(OSTRA_IMAGE_SIZE, 0x5A);
+    return image;
+}
+
+std::vector<Operation> Operations() {
+    using P = PellandoFunctionality;
+    static std::array<std::uint8_t, Protocol::ReadoutBytes> readout;
+    static std::uint8_t byte;
+    static std::uint16_t word;
+    return {
+        {"MeasureRequest", OnInstrument([](P& i) { i.MeasureRequest(readout.data(), 256, 1); })},
+        {"SetMeasureParameters", OnInstrument([](P& i) { i.SetMeasureParameters(1, 2, 3, 4); })},
+        {"GetMeasureParameters",
+         OnInstrument([](P& i) { i.GetMeasureParameters(word, word, word, byte, byte); })},
+        {"SetMeasureMode", OnInstrument([](P& i) { i.SetMeasureMode(1); })},
+        {"GetMeasureMode", OnInstrument([](P& i) { i.GetMeasureMode(byte, byte, byte, byte, byte, byte); })},
+        {"WriteEEPROM", OnInstrument([](P& i) { i.WriteEEPROM(100, std::vector<std::uint8_t>(300)); })},
+        {"ReadEEPROM", OnInstrument([](P& i) {
+             std::vector<std::uint8_t> data(100);
+             i.ReadEEPROM(0, data);
+         })},
+        {"WriteCPLD", OnInstrument([](P& i) { i.WriteCPLD(1, 2, 3); })},
+        {"ReadCPLD", OnInstrument([](P& i) { i.ReadCPLD(word); })},
+        {"DownloadRAMFirmware", OnInstrument([](P& i) {
+             i.DownloadFirmware(0, {1, 2, 3}, false);
+         })},
+        {"DownloadEEPROMFirmware", OnInstrument([](P& i) {
+             i.DownloadFirmware(0, {1, 2, 3}, true);
+         })},
+        {"GetMISC", OnInstrument([](P& i) { i.GetMISC(byte, word, byte, word, word); })},
+        {"Reset", OnInstrument([](P& i) { i.Reset(7); })},
+        {"FixedScan", OnInstrument([](P& i) { RunScan(i, ScanTotal); }), ScanTotal},
+        {"OpenScan", OnInstrument([](P& i) { RunScan(i, 0); }), OpenScanTotal},
+        {"ExportedReadout",
+         []() -> Outcome {
+             std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
+             const std::int32_t code = d4fb86cecc88582a(values.data(), "");
+             EXPECT_TRUE(code == OSTRA_OK || code == OSTRA_FAILURE) << code;
+             return code == OSTRA_OK ? Outcome() : Outcome(b5ae189db26b2a1b("LastError"));
+         }},
+        {"ExportedImageWrite",
+         []() -> Outcome {
+             const std::int32_t code = f3355d91d5df0e0b(Image().data(), "");
+             EXPECT_TRUE(code == OSTRA_OK || code == OSTRA_UNKNOWN_FAILURE) << code;
+             return code == OSTRA_OK ? Outcome() : Outcome(b5ae189db26b2a1b("LastError"));
+         }},
+    };
+}
+
+/// Texts that a failure may have; the exports say nothing when the instrument could not be opened.
+bool IsDocumented(Transport transport, const std::string& text) {
+    static const std::regex native(
+        "(Device IO control failed:? |(read|write) data failed|could not open pipe:|interrupt listener "
+        "thread had timeout|"
+        "Read data failed \\(|system busy\\. try again\\. Read data failed \\(|No devices connected|"
+        "No such device connected)[^]*");
+    static const std::regex usbio(
+        "(Error in UsbIo function: \"\\w+\" Error: Error code 0x[0-9A-F]{8}: .+|No such device connected|"
+        "requested device not found|interrupt listener thread had timeout)");
+    return text.empty() || std::regex_match(text, transport == Transport::Native ? native : usbio);
+}
+
+/// Whether an operation can end well although this fault hit this transfer.
+bool MayGoUnnoticed(Transport transport, const Fault& fault, const RecordedTransfer& undisturbed) {
+    const bool control = undisturbed.endpoint == 0;
+    if (undisturbed.endpoint == Protocol::InterruptInEndpoint ||
+        undisturbed.status == TransferStatus::Cancelled) {
+        return true;  // the button, or a read beyond the end of a scan
+    }
+    if (control && undisturbed.setup.request == static_cast<std::uint8_t>(Protocol::Request::ButtonReport)) {
+        return true;  // sent while closing, not reported
+    }
+    switch (fault.kind) {
+        case FaultKind::Stale:
+        case FaultKind::Garbage:
+        case FaultKind::Flip:
+        case FaultKind::Late:
+        case FaultKind::GoneAfter:
+            return true;
+        case FaultKind::Short:
+        case FaultKind::Empty:
+            return control || transport == Transport::UsbIo || undisturbed.length == 0;
+        case FaultKind::Long:
+            return undisturbed.length == 0;
+        default:
+            return false;
+    }
+}
+
+class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size_t>> {
+  protected:
+    const Transport transport = std::get<0>(GetParam());
+    const Operation operation = Operations()[std::get<1>(GetParam())];
+
+    Simulator::InstrumentSettings Settings() const {
+        Simulator::InstrumentSettings settings;
+        settings.scanBytes = operation.scanBytes;
+        return settings;
+    }
+
+    std::vector<RecordedTransfer> Undisturbed() const {
+        Platform::VirtualClock clock(1);
+        SimulatedHost host(transport);
+        host.Add("one", Settings());
+        Simulator::TransferRecorder recorder;
+        host.Bus().WrapDevices([&](const std::string&, auto device) { return recorder.Record(device); });
+        EXPECT_EQ(operation.run(), std::nullopt);
+        return recorder.Transfers();
+    }
+
+    void RunWith(const FaultPlan& plan, const RecordedTransfer& undisturbed) const {
+        SCOPED_TRACE(plan.Text());
+        const Fault& fault = plan.Faults().front();
+        Platform::VirtualClock clock(fault.index + 1);
+        SimulatedHost host(transport);
+        auto& instrument = host.Add("one", Settings());
+        const auto script = std::make_shared<Simulator::FaultScript>(plan);
+        host.Bus().WrapDevices([&](const std::string&, auto device) {
+            return Simulator::InjectFaults(device, script, Platform::ClockScheduler(),
+                                           [&] { instrument.Unplug(); });
+        });
+        const Outcome outcome = operation.run();
+        EXPECT_LT(clock.ElapsedMilliseconds(), TimeLimit);
+        if (outcome) {
+            EXPECT_TRUE(IsDocumented(transport, *outcome)) << *outcome;
+        } else if (script->Hits() > 0 && script->Transfers() > fault.index) {
+            EXPECT_TRUE(MayGoUnnoticed(transport, fault, undisturbed)) << "passed all the same";
+        }
+        EXPECT_EQ(instrument.PendingTransfers(), 0U);
+        EXPECT_FALSE(instrument.Claimed());
+
+        // The next open works, or says that the device is gone.
+        host.Bus().WrapDevices(nullptr);
+        if (!instrument.PluggedIn()) {
+            EXPECT_THROW(PellandoFunctionality(nullptr, 0), DeviceDriverException);
+            instrument.PlugIn();
+        }
+        const Outcome next = operation.run();
+        EXPECT_EQ(next, std::nullopt) << *next;
+    }
+};
+
+/// Faults that have a number, with one that every transfer notices.
+std::optional<std::uint32_t> ArgumentOf(FaultKind kind) {
+    switch (kind) {
+        case FaultKind::Late:
+            return 20;
+        case FaultKind::Flip:
+            return 0;
+        default:
+            return std::nullopt;
+    }
+}
+
+TEST_P(FaultSweep, EveryFaultAtEveryTransfer) {
+    const std::vector<RecordedTransfer> undisturbed = Undisturbed();
+    // The pieces of a whole image are alike: the first and last ones stand for all, and samples between.
+    const std::size_t count = undisturbed.size();
+    std::size_t cases = 0;
+    for (std::size_t index = 0; index < count; index += (index > 12 && index + 12 < count) ? 11 : 1) {
+        for (const auto& name : Simulator::AllFaults()) {
+            for (const bool fromThenOn : {false, true}) {
+                Fault fault;
+                fault.index = static_cast<std::uint32_t>(index);
+                fault.fromThenOn = fromThenOn;
+                fault.kind = name.kind;
+                fault.argument = ArgumentOf(name.kind);
+                RunWith(FaultPlan({fault}), undisturbed[index]);
+                ++cases;
+                if (HasFailure()) {
+                    return;  // one case is enough to look into
+                }
+            }
+        }
+    }
+    std::printf("%zu transfers, %zu cases\n", count, cases);
+    EXPECT_GT(cases, 50U);
+}
+
+INSTANTIATE_TEST_SUITE_P(All, FaultSweep,
+                         testing::Combine(testing::Values(Transport::Native, Transport::UsbIo),
+                                          testing::Range<std::size_t>(0, 17)),
+                         [](const auto& parameter) {
+                             return std::string(Name(std::get<0>(parameter.param))) + "_" +
+                                    Operations()[std::get<1>(parameter.param)].name;
+                         });
+
+}  // namespace
+}  // namespace Varnholt::Tests
