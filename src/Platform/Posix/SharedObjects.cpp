@@ -69,6 +69,7 @@ class SharedMutex final : public MutexObject {
         : file(std::move(opened)), content(*static_cast<MutexContent*>(file->Memory())) {}
 
     bool IsHeldElsewhere() const override { return !IsOwnedHere(); }
+    bool TakenByItsThreadOnly() const override { return true; }
     std::string Describe() const override { return MutexObject::Describe() + " shared between processes"; }
 
   private:

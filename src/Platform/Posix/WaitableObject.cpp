@@ -71,6 +71,10 @@ void WaitableObject::OfferToWaiters() {
         if (waiter->IsSatisfied()) {
             continue;
         }
+        if (TakenByItsThreadOnly()) {
+            CurrentClock().Wake(*waiter);
+            return;
+        }
         if (!waiter->Offer(*this)) {
             return;
         }
@@ -92,6 +96,7 @@ WaitAnyResult WaitForAny(KernelHold& hold, std::span<const ObjectRef> objects, M
         } else {
             clock.Block(hold, waiter, deadline);
         }
+        waiter.woken = false;  // perhaps to look for itself, in vain
         if (waiter.hopeless) {
             SetLastError(Errors::OperationAborted);
             return {WaitResult::Failed, 0};

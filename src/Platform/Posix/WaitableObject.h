@@ -33,6 +33,8 @@ class WaitableObject {
     virtual ErrorCode Signal(ThreadRecord& signaller) = 0;
     /// True when another process may have to make the object available.
     virtual bool IsHeldElsewhere() const { return false; }
+    /// True when only the thread that waits can take it: it is then woken to look for itself.
+    virtual bool TakenByItsThreadOnly() const { return false; }
     /// After a wait of the caller has taken the object, without the kernel lock.
     virtual void AfterWait() {}
     /// The last handle is closed by `closer`.
