@@ -1,3 +1,4 @@
+#include <atomic>
 #include <functional>
 #include <thread>
 #include <vector>
@@ -411,6 +412,32 @@ TEST(RequestOrder, EndsOnceInEveryOrder) {
         EXPECT_TRUE(files->CloseFile(pipe));
         EXPECT_TRUE(files->CloseFile(main));
     }
+}
+
+// The device may still be looking at a transfer that it has completed: the cancellation must return first.
+TEST(RequestOrder, ClosingWaitsForACancellationUnderWay) {
+    HookedBus bus;
+    const auto files = Platform::Drivers::MakeDriverFileSystem(bus);
+    const auto pipe = files->Open("native/port1\\PIPE01");
+    std::atomic<bool> closed{false};
+    std::thread closer;
+    bus.device->onSubmit = [](Transfer&) { return Errors::Success; };
+    bus.device->onCancel = [&](Transfer& transfer) {
+        HookedDevice::Complete(transfer, TransferStatus::Cancelled, 0);
+        closer = std::thread([&] {
+            EXPECT_TRUE(files->CloseFile(pipe));
+            closed = true;
+        });
+        Platform::SleepMilliseconds(20);
+        EXPECT_FALSE(closed);
+    };
+    Bytes buffer(8);
+    Request request;
+    EXPECT_FALSE(files->StartRead(pipe, buffer.data(), 8, request.record));
+    EXPECT_TRUE(files->CancelTransfers(pipe));
+    closer.join();
+    EXPECT_EQ(bus.device->cancels, 1);
+    EXPECT_TRUE(request.TakeSignal());
 }
 
 // A failure that is known at once is still the result of a request that was started.
