@@ -371,8 +371,12 @@ void OpenFile::GiveEvent(Waiter& waiter) {
         const std::lock_guard guard(lock);
         waiter.event = std::move(spareEvent);
     }
-    if (!waiter.event) {
-        waiter.event = OwnedHandle(MakeAutoResetEvent());
+    try {
+        if (!waiter.event) {
+            waiter.event = OwnedHandle(MakeAutoResetEvent());
+        }
+    } catch (...) {
+        // The wait must go on: a buffer is in use.
     }
 }
 
@@ -382,9 +386,13 @@ void OpenFile::Enlist(Waiter& waiter) {
 }
 
 void OpenFile::Await(Waiter& waiter) {
-    const bool signalled = waiter.event && Wait(waiter.event.Get(), Infinite) == WaitResult::Signalled;
+    bool signalled = false;
+    try {
+        signalled = waiter.event && Wait(waiter.event.Get(), Infinite) == WaitResult::Signalled;
+    } catch (...) {
+    }
     while (!signalled && !waiter.released.load(std::memory_order_acquire)) {
-        SleepMilliseconds(1);
+        Pause(1);
     }
     if (signalled) {
         const std::lock_guard guard(lock);

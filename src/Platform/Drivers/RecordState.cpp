@@ -29,7 +29,7 @@ bool IsRunning(const Overlapped& record) {
             return state == Pending;
         }
         // Yielding alone could go on for ever if the signalling thread has a lower priority.
-        SleepMilliseconds(round < Yields ? 0 : 1);
+        Pause(round < Yields ? 0 : 1);
     }
 }
 
@@ -41,7 +41,11 @@ ErrorCode OutcomeOf(const Overlapped& record, std::uint32_t& transferred) {
 
 void MarkRunning(Overlapped& record) {
     if (record.event != NoHandle) {
-        Wait(record.event, 0);
+        try {
+            Wait(record.event, 0);
+        } catch (...) {
+            // A signal from before is then taken for this request's: its waiter finds it still running.
+        }
     }
     record.internalHigh = 0;
     StateOf(record).store(Pending, std::memory_order_release);
@@ -57,11 +61,23 @@ void MarkEnded(Overlapped& record, ErrorCode code, std::uint32_t transferred) {
     StateOf(record).store(code, std::memory_order_release);
 }
 
-void SignalSurely(Handle event) {
-    // A system's driver does not signal through a call that a test can make fail: the first failure may be a
-    // test's.
-    if (!SignalEvent(event)) {
-        SignalEvent(event);
+void SignalSurely(Handle event) noexcept {
+    // A system's driver does not signal through a call that can run out of memory or that a test can make
+    // fail: the first failure may be one of these.
+    for (int attempt = 0; attempt < 2; ++attempt) {
+        try {
+            if (SignalEvent(event)) {
+                return;
+            }
+        } catch (...) {
+        }
+    }
+}
+
+void Pause(std::uint32_t milliseconds) noexcept {
+    try {
+        SleepMilliseconds(milliseconds);
+    } catch (...) {
     }
 }
 

@@ -22,7 +22,10 @@ void MarkRunning(Overlapped& record);
 void MarkEnded(Overlapped& record, ErrorCode code, std::uint32_t transferred);
 
 /// Signals an event that somebody may wait for without limit.
-void SignalSurely(Handle event);
+void SignalSurely(Handle event) noexcept;
+
+/// Gives other threads time; never fails.
+void Pause(std::uint32_t milliseconds) noexcept;
 
 /// The record of a request that was never started: a failure without a signal.
 void MarkNotStarted(Overlapped& record, ErrorCode code);
