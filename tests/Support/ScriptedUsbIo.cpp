@@ -114,6 +114,12 @@ std::size_t ScriptedUsbIo::Running(std::uint8_t endpoint) const {
         }));
 }
 
+std::uint64_t ScriptedUsbIo::BytesIn(std::uint8_t endpoint) const {
+    const std::lock_guard held(lock);
+    const auto found = bytesIn.find(endpoint);
+    return found == bytesIn.end() ? 0 : found->second;
+}
+
 std::size_t ScriptedUsbIo::MostControlsAtOnce() const {
     const std::lock_guard held(lock);
     return mostControls;
@@ -264,6 +270,7 @@ void ScriptedUsbIo::End(std::uint64_t number, ErrorCode code, bool withData) {
         if (found->target) {
             moved = std::min(moved, found->answer.data.size());
             std::copy_n(found->answer.data.begin(), moved, found->target);
+            bytesIn[found->file->endpoint] += found->isControl ? 0 : moved;
         }
         found->record->internalHigh = found->answer.reportedCount.value_or(static_cast<std::uint32_t>(moved));
         found->record->offset = code;

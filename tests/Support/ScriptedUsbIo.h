@@ -60,6 +60,8 @@ class ScriptedUsbIo final : public Platform::DeviceFileSystem {
     std::vector<std::string> TakeTranscript();
     std::size_t OpenFiles() const;
     std::size_t Running(std::uint8_t endpoint) const;
+    /// What all reads of the endpoint brought in together.
+    std::uint64_t BytesIn(std::uint8_t endpoint) const;
     /// The most controls that were ever running at once.
     std::size_t MostControlsAtOnce() const;
 
@@ -110,6 +112,7 @@ class ScriptedUsbIo final : public Platform::DeviceFileSystem {
     std::map<std::string, Platform::ErrorCode> refusals;
     std::vector<std::string> transcript;
     std::vector<Platform::EventScheduler::EventId> events;
+    std::map<std::uint8_t, std::uint64_t> bytesIn;
     std::uint64_t lastNumber = 0;
     std::size_t mostControls = 0;
 };

@@ -4,9 +4,9 @@
 #include <vector>
 
 #include "Platform/CallFilter.h"
-#include "Platform/Time.h"
 #include "Protocol/Instrument.h"
 #include "Support/ScriptedUsbIo.h"
+#include "Support/Stopwatch.h"
 #include "TestClock.h"
 #include "UsbIo/CUsbIoPipe.h"
 #include "UsbIo/ScopedDeviceList.h"
@@ -101,9 +101,9 @@ TEST_F(CUsbIoPipeTest, ATimedOutReadReturnsOnlyWhenItsBufferIsFree) {
                   {.data = {7, 7}, .after = Never, .cancelledAfter = 60, .cancelledWithData = true});
     std::vector<std::uint8_t> buffer(2);
     std::uint32_t size = 2;
-    const std::uint32_t before = Platform::TickCount();
+    const Tests::Stopwatch stopwatch;
     EXPECT_EQ(pipe.ReadSync(buffer.data(), size, 100), Status::TimedOut);
-    EXPECT_GE(Platform::TickCount() - before, 150U);
+    EXPECT_GE(stopwatch.Milliseconds(), 150U);
     EXPECT_THAT(buffer, Each(7));
 }
 
@@ -188,6 +188,37 @@ TEST_F(CUsbIoPipeTest, TransfersOfOnePipeOverlap) {
     EXPECT_EQ(pipe.WaitForCompletion(first, 1000), Status::Success);
     EXPECT_EQ(first.BytesTransferred, 1U);
     EXPECT_EQ(second.BytesTransferred, 2U);
+}
+
+TEST(CUsbIoPipeRace, NoByteIsLostOrCountedTwiceWhenATimeOutMeetsACompletion) {
+    std::uint32_t timedOut = 0;
+    std::uint32_t rounds = 0;
+    for (std::uint64_t seed = 1; seed <= Tests::TestClock::Seeds; ++seed) {
+        const Tests::TestClock clock(seed);
+        ScriptedUsbIo driver;
+        const Platform::ScopedDeviceFiles files(driver);
+        CUsbIoPipe pipe;
+        ASSERT_EQ(pipe.Bind(0, BulkInEndpoint, nullptr, nullptr), Status::Success);
+        std::uint64_t reported = 0;
+        for (std::uint32_t i = 0; i < 60; ++i, ++rounds) {
+            driver.Script(BulkInEndpoint,
+                          {.data = {1, 2, 3},
+                           .after = 4 + i % 3,
+                           .cancelledAfter = i % 4,
+                           .cancelledCode = i % 7 == 0 ? 0 : Platform::Errors::OperationAborted,
+                           .cancelledWithData = i % 5 == 0});
+            std::vector<std::uint8_t> buffer(3);
+            std::uint32_t size = 3;
+            const std::uint32_t status = pipe.ReadSync(buffer.data(), size, 5);
+            EXPECT_TRUE(status == Status::TimedOut || (status == Status::Success && size == 3));
+            EXPECT_EQ(buffer[0], size == 3 ? 1 : 0) << seed << " " << i;
+            timedOut += status == Status::TimedOut;
+            reported += size;
+        }
+        ASSERT_EQ(reported, driver.BytesIn(BulkInEndpoint)) << seed;
+    }
+    EXPECT_GT(timedOut, rounds / 4);
+    EXPECT_LT(timedOut, rounds * 3 / 4);
 }
 
 }  // namespace

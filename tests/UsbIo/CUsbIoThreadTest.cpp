@@ -7,9 +7,9 @@
 #include <mutex>
 #include <vector>
 
-#include "Platform/Time.h"
 #include "Protocol/Instrument.h"
 #include "Support/ScriptedUsbIo.h"
+#include "Support/Stopwatch.h"
 #include "TestClock.h"
 #include "UsbIo/CUsbIoReader.h"
 #include "UsbIo/CUsbIoWriter.h"
@@ -143,9 +143,9 @@ TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
         Platform::SleepMilliseconds(1);
     }
     reader.onCompleted = {};
-    const std::uint32_t before = Platform::TickCount();
+    const Tests::Stopwatch stopwatch;
     EXPECT_TRUE(reader.ShutdownThread());
-    EXPECT_LT(Platform::TickCount() - before, 500U);
+    EXPECT_LT(stopwatch.Milliseconds(), 500U);
     EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
     EXPECT_EQ(reader.FreeBufferCount(), 4U);
     EXPECT_TRUE(reader.ShutdownThread());

@@ -8,6 +8,9 @@ namespace Varnholt::Tests {
 /// take turns, because a race between them is what is looked for.
 class TestClock final {
   public:
+    /// Seeds from 1 on that are worth a try.
+    static constexpr std::uint64_t Seeds = 1;
+
     explicit TestClock(std::uint64_t /*seed*/ = 1) {}
 };
 

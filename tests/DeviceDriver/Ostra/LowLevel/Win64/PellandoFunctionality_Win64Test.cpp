@@ -8,8 +8,8 @@
 #include "DeviceDriver/Ostra/LowLevel/Win64/PellandoFunctionality_Win64.h"
 #include "DeviceDriver/Ostra/USB/Win64/USBBrowserImpl_Win64.h"
 #include "Platform/CallFilter.h"
-#include "Platform/Time.h"
 #include "Protocol/Instrument.h"
+#include "Support/Stopwatch.h"
 #include "UsbIoTransportFixture.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
@@ -112,11 +112,11 @@ TEST_F(PellandoFunctionality_Win64Test, CommandsOnTheWire) {
     const auto instrument = Open();
     for (const Case& row : cases) {
         driver.Script(BulkInEndpoint, {.data = {1, 2, 3, 4}});
-        const std::uint32_t before = Platform::TickCount();
+        const Tests::Stopwatch stopwatch;
         row.command(*instrument);
         EXPECT_THAT(TakeTransfers(), ElementsAreArray(row.expected)) << row.name;
         if (!row.expected.empty()) {
-            EXPECT_GE(Platform::TickCount() - before + 1, 1U);
+            EXPECT_GE(stopwatch.Milliseconds(), 1U) << "the pause before a request";
         }
     }
 }
@@ -180,13 +180,12 @@ TEST_F(PellandoFunctionality_Win64Test, ReadsWaitTheirTimeAnd5SecondsMore) {
     const auto instrument = Open();
     for (const Case& row : cases) {
         std::array<std::uint8_t, 64> buffer;
-        const std::uint32_t before = Platform::TickCount();
+        const Tests::Stopwatch stopwatch;
         EXPECT_EQ(TextOf<IOException>([&] { row.command(*instrument, buffer.data()); }),
                   "Error in UsbIo function: \"ReadSync\" Error: Error code 0xE000100C: The request has been "
                   "timed out.");
-        const std::uint32_t waited = Platform::TickCount() - before;
-        EXPECT_GE(waited, row.limit) << row.name;
-        EXPECT_LE(waited, row.limit + 100) << row.name;
+        EXPECT_GE(stopwatch.Milliseconds(), row.limit) << row.name;
+        EXPECT_LE(stopwatch.Milliseconds(), row.limit + 100) << row.name;
         EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
     }
 }
