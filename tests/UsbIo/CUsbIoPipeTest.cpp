@@ -81,6 +81,7 @@ TEST_F(CUsbIoPipeTest, ReadSyncReportsStatusAndBytesMoved) {
          100,
          Status::TimedOut,
          4},
+        {"more than there is room for", {.data = data, .reportedCount = 99}, 100, 0, 4},
         {"not waited for", {.data = data, .after = Never}, 0, Status::TimedOut, 0},
     };
     for (const Case& row : cases) {

@@ -225,21 +225,6 @@ TEST_F(CUsbIoThreadTest, SomethingThrownEndsTheThread) {
     EXPECT_TRUE(reader.ShutdownThread());
 }
 
-TEST_F(CUsbIoThreadTest, AThreadThatEndedByItselfCanBeStartedAgain) {
-    Reader reader;  // without buffers there is nothing to read
-    for (int i = 0; i < 20; ++i) {
-        ASSERT_TRUE(reader.StartThread());
-        ASSERT_TRUE(reader.WaitForExit());
-        ASSERT_TRUE(reader.ShutdownThread());
-    }
-    ASSERT_TRUE(reader.StartThread());
-    ASSERT_TRUE(reader.WaitForExit());
-    while (!reader.StartThread()) {  // until the first thread has let go of its handle
-        Platform::SleepMilliseconds(1);
-    }
-    EXPECT_TRUE(reader.ShutdownThread());
-}
-
 TEST_F(CUsbIoThreadTest, WritesUntilFinished) {
     Writer writer;
     Bind(writer, BulkOutEndpoint);
@@ -265,6 +250,20 @@ TEST_F(CUsbIoThreadTest, AWriterThatIsFinishedAtOnceSendsNothing) {
     EXPECT_TRUE(writer.WaitForExit());
     EXPECT_TRUE(writer.ShutdownThread());
     EXPECT_THAT(driver.TakeTranscript(), IsEmpty());
+}
+
+TEST(CUsbIoThreadRace, AThreadThatEndedByItselfCanBeStartedAgain) {
+    for (std::uint64_t seed = 1; seed <= Tests::TestClock::Seeds; ++seed) {
+        const Tests::TestClock clock(seed);
+        Reader reader;  // without buffers there is nothing to read
+        ASSERT_TRUE(reader.StartThread());
+        ASSERT_TRUE(reader.WaitForExit());
+        Platform::SleepMilliseconds(50);  // the thread lets go of its handle behind that
+        ASSERT_TRUE(reader.StartThread()) << seed;
+        ASSERT_TRUE(reader.ShutdownThread());
+        ASSERT_TRUE(reader.StartThread()) << seed;
+        ASSERT_TRUE(reader.ShutdownThread());
+    }
 }
 
 }  // namespace

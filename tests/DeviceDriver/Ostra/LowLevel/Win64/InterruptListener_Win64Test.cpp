@@ -65,10 +65,17 @@ class InterruptListener_Win64Test : public testing::Test {
     }
     /// The read that throws away what is left from before, and finds nothing.
     void ScriptStaleRead() { driver.Script(InterruptInEndpoint, {.after = Never}); }
-    /// Until the listener has begun its next read.
     void WaitForRead() {
         while (driver.Running(InterruptInEndpoint) == 0) {
             Platform::SleepMilliseconds(1);
+        }
+    }
+    /// Until the listener has begun that many reads in all.
+    void WaitForReads(std::size_t count) {
+        for (std::size_t begun = 0; begun < count; Platform::SleepMilliseconds(1)) {
+            for (const std::string& line : driver.TakeTranscript()) {
+                begun += line.rfind("read", 0) == 0;
+            }
         }
     }
     /// Milliseconds.
@@ -133,9 +140,7 @@ TEST_F(InterruptListener_Win64Test, ReadsTurnIntoMessages) {
 TEST_F(InterruptListener_Win64Test, AnInterruptFromBeforeIsThrownAway) {
     driver.Script(InterruptInEndpoint, {.data = {1}, .after = 1});
     listener.Start();
-    while (driver.TakeTranscript().size() < 2) {
-        Platform::SleepMilliseconds(5);
-    }
+    WaitForReads(2);
     listener.Stop();
     EXPECT_THAT(receiver.Codes(), IsEmpty());
     EXPECT_FALSE(listener.IsTouched());
@@ -162,13 +167,14 @@ TEST_F(InterruptListener_Win64Test, StopsAtOnceInEveryPlace) {
 }
 
 TEST_F(InterruptListener_Win64Test, AFailureDuringTheStopIsNoMessage) {
+    const Platform::OwnedHandle inRead(Platform::MakeAutoResetEvent());
     ScriptStaleRead();
-    driver.Script(InterruptInEndpoint, {.after = Never, .cancelledCode = Status::DeviceGone});
+    driver.Script(InterruptInEndpoint, {.code = Status::DeviceGone, .refused = true, .onStart = [&] {
+                                            Platform::SignalEvent(inRead.Get());
+                                            Platform::SleepMilliseconds(50);
+                                        }});
     listener.Start();
-    while (driver.TakeTranscript().size() < 2) {
-        Platform::SleepMilliseconds(5);
-    }
-    WaitForRead();
+    ASSERT_EQ(Platform::Wait(inRead.Get(), Limit), Platform::WaitResult::Signalled);
     listener.Stop();
     EXPECT_THAT(receiver.Codes(), IsEmpty());
 }
