@@ -1,0 +1,133 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <bit>
+#include <limits>
+
+#include "DeviceDriver/Generic/Configuration/Property.h"
+#include "Utilities/Exceptions/Exceptions.h"
+
+namespace Varnholt::DeviceDriver::Generic::Configuration {
+namespace {
+
+using testing::ElementsAre;
+using testing::IsEmpty;
+using testing::StrEq;
+using testing::ThrowsMessage;
+using Varnholt::Utilities::Exceptions::RuntimeException;
+using Bytes = std::vector<std::uint8_t>;
+using Longs = std::vector<std::int32_t>;
+using Floats = std::vector<float>;
+
+constexpr const char* InvalidType = "Invalid configuration data type.";
+
+struct Case {
+    const char* name;
+    Property value;
+    PropertyType type;
+    Longs longs;
+    Floats floats;
+    Bytes bigEndian;
+};
+
+const std::vector<Case>& Cases() {
+    static const std::vector<Case> cases{
+        {"nothing", Property(), TypeNone, {}, {}, {}},
+        {"8 bits extended", Property(std::int8_t{-3}), TypeLong, {-3}, {}, {0xFF, 0xFF, 0xFF, 0xFD}},
+        {"16 bits extended", Property(std::int16_t{-2}), TypeLong, {-2}, {}, {0xFF, 0xFF, 0xFF, 0xFE}},
+        {"32 bits", Property(std::int32_t{0x01020304}), TypeLong, {0x01020304}, {}, {1, 2, 3, 4}},
+        {"float", Property(1.0F), TypeFloat, {}, {1.0F}, {0x3F, 0x80, 0, 0}},
+        {"integers",
+         Property(Longs{1, -1}),
+         TypeLongVector,
+         {1, -1},
+         {},
+         {0, 0, 0, 1, 0xFF, 0xFF, 0xFF, 0xFF}},
+        {"floats", Property(Floats{-2.0F}), TypeFloatVector, {}, {-2.0F}, {0xC0, 0, 0, 0}},
+        {"no integers", Property(Longs{}), TypeLongVector, {}, {}, {}},
+    };
+    return cases;
+}
+
+void ExpectHolds(const Property& value, const Case& expected) {
+    EXPECT_EQ(value.GetType(), expected.type);
+    EXPECT_EQ(value.AsLongVector(), expected.longs);
+    EXPECT_EQ(value.AsFloatVector(), expected.floats);
+    EXPECT_EQ(value.SizeOf(), expected.bigEndian.size());
+}
+
+TEST(Property, ConstructionFixesTypeAndBytes) {
+    for (const Case& row : Cases()) {
+        SCOPED_TRACE(row.name);
+        ExpectHolds(row.value, row);
+        if (row.type != TypeNone) {
+            EXPECT_EQ(row.value.AsByteVector(true), row.bigEndian);
+        }
+    }
+}
+
+TEST(Property, AssigningReplacesTypeAndValueWhateverWasThere) {
+    for (const Case& before : Cases()) {
+        SCOPED_TRACE(before.name);
+        Property value = before.value;
+        ExpectHolds(value.Assign(std::int8_t{-3}), Cases()[1]);
+        value = before.value;
+        ExpectHolds(value.Assign(std::int16_t{-2}), Cases()[2]);
+        value = before.value;
+        ExpectHolds(value.Assign(std::int32_t{0x01020304}), Cases()[3]);
+        value = before.value;
+        ExpectHolds(value.Assign(1.0F), Cases()[4]);
+        value = before.value;
+        ExpectHolds(value.Assign(Longs{1, -1}), Cases()[5]);
+        value = before.value;
+        ExpectHolds(value.Assign(Floats{-2.0F}), Cases()[6]);
+    }
+}
+
+TEST(Property, BytesRefillTheValueAndKeepTheType) {
+    const Bytes ten{0, 0, 0, 1, 0x80, 0, 0, 0, 9, 9};
+    Property longs(Longs{5});
+    EXPECT_THAT(longs.Assign(ten, true).AsLongVector(),
+                ElementsAre(1, std::numeric_limits<std::int32_t>::min()));
+    EXPECT_EQ(longs.GetType(), TypeLongVector);
+    EXPECT_THAT(longs.Assign(ten, false).AsLongVector(), ElementsAre(0x01000000, 0x00000080));
+
+    Property single(std::int32_t{7});
+    EXPECT_THAT(single.Assign(ten, true).AsLongVector(), testing::SizeIs(2));
+    EXPECT_EQ(single.GetType(), TypeLong);
+    EXPECT_EQ(single.SizeOf(), 8U);
+
+    const Bytes one{0x3F, 0x80, 0, 0};
+    Property real(0.0F);
+    EXPECT_EQ(real.Assign(one, true).AsFloat(), 1.0F);
+    EXPECT_EQ(std::bit_cast<std::uint32_t>(real.Assign(one, false).AsFloat()), 0x0000803FU);
+    EXPECT_EQ(real.GetType(), TypeFloat);
+
+    EXPECT_THAT(real.Assign(Bytes{1, 2, 3}, true).AsFloatVector(), IsEmpty());
+    EXPECT_EQ(real.SizeOf(), 0U);
+}
+
+TEST(Property, EveryBitPatternOfAFloatSurvives) {
+    for (const std::uint32_t pattern : {0x7F800001U, 0x7FC12345U, 0xFFFFFFFFU, 0x80000000U, 0x00000001U}) {
+        Property value(0.0F);
+        Bytes bytes(4);
+        for (std::size_t i = 0; i < bytes.size(); ++i) {
+            bytes[i] = static_cast<std::uint8_t>(pattern >> (8 * i));
+        }
+        EXPECT_EQ(value.Assign(bytes, false).AsByteVector(false), bytes) << std::hex << pattern;
+    }
+}
+
+TEST(Property, WithoutATypeOrAnElementNothingIsRead) {
+    Property none;
+    const Property noIntegers((Longs()));
+    const Property noFloats((Floats()));
+    EXPECT_THAT([&] { none.Assign(Bytes(4), true); }, ThrowsMessage<RuntimeException>(StrEq(InvalidType)));
+    EXPECT_THAT([&] { none.AsByteVector(true); }, ThrowsMessage<RuntimeException>(StrEq(InvalidType)));
+    EXPECT_THAT([&] { noIntegers.AsLong(); }, ThrowsMessage<RuntimeException>(StrEq(InvalidType)));
+    EXPECT_THAT([&] { Property(1.0F).AsLong(); }, ThrowsMessage<RuntimeException>(StrEq(InvalidType)));
+    EXPECT_THAT([&] { noFloats.AsFloat(); }, ThrowsMessage<RuntimeException>(StrEq(InvalidType)));
+}
+
+}  // namespace
+}  // namespace Varnholt::DeviceDriver::Generic::Configuration

@@ -1,0 +1,145 @@
+#include <gtest/gtest.h>
+
+#include <vector>
+
+#include "DeviceDriver/Generic/Utilities/PrecisionTime.h"
+#include "DeviceDriver/Generic/Utilities/Timing.h"
+#include "DeviceDriver/Generic/Utilities/Win32/Timing_PC.h"
+#include "Platform/Time.h"
+
+namespace Varnholt::DeviceDriver::Generic::Utilities {
+namespace {
+
+ActualTime At(std::int32_t seconds, std::uint16_t milliseconds) {
+    ActualTime time{};
+    time.seconds = seconds;
+    time.milliseconds = milliseconds;
+    return time;
+}
+
+class TimingAt final : public Timing_PC {
+  public:
+    using Timing_PC::operator=;
+    explicit TimingAt(const ActualTime& fixed) : now(fixed) {}
+    ActualTime GetActualTime() override { return now; }
+
+  private:
+    const ActualTime now;
+};
+
+TEST(Timing, DifferenceInSeconds) {
+    struct Case {
+        const char* name;
+        ActualTime earlier;
+        ActualTime now;
+        double expected;
+    };
+    const std::vector<Case> cases{
+        {"equal", At(5, 250), At(5, 250), 0.0},
+        {"fraction only", At(5, 250), At(5, 750), 0.5},
+        {"whole and fraction", At(100, 0), At(101, 250), 1.25},
+        {"fraction borrows", At(10, 950), At(12, 50), 1.1},
+        {"earlier is later", At(12, 50), At(10, 950), -1.1},
+        {"farther apart than 32 bits hold", At(-2000000000, 0), At(2000000000, 0), 4e9},
+    };
+    for (const Case& row : cases) {
+        EXPECT_NEAR(TimingAt(row.now).GetDiffTime(row.earlier), row.expected, 1e-9) << row.name;
+    }
+}
+
+TEST(Timing, ActualTimeIsTheWallClockInLocalTime) {
+    const auto timing = Timing::Instance();
+    const std::int64_t before = Platform::WallClockNow().seconds;
+    const ActualTime time = timing->GetActualTime();
+    const std::int64_t after = Platform::WallClockNow().seconds;
+    EXPECT_GE(time.seconds, static_cast<std::int32_t>(before));
+    EXPECT_LE(time.seconds, static_cast<std::int32_t>(after));
+    EXPECT_LT(time.milliseconds, 1000);
+    const Platform::CalendarTime calendar = Platform::LocalCalendarTime(time.seconds);
+    EXPECT_EQ(time.year, calendar.year);
+    EXPECT_EQ(time.month, calendar.month);
+    EXPECT_EQ(time.day, calendar.day);
+    EXPECT_EQ(time.hour, calendar.hour);
+    EXPECT_EQ(time.minute, calendar.minute);
+    EXPECT_EQ(time.second, calendar.second);
+    EXPECT_NEAR(timing->GetActualTimeStamp(), static_cast<std::uint32_t>(after), 1);
+}
+
+TEST(Timing, SleepLastsAndIsSeenByTheClock) {
+    const auto timing = Timing::Instance();
+    PrecisionTime start;
+    start.SetToNow();
+    const ActualTime earlier = timing->GetActualTime();
+    timing->DeviceDriverSleep(30);
+    std::int32_t seconds = 0, milliseconds = 0, microseconds = 0;
+    start.GetElapsed(seconds, milliseconds, microseconds);
+    EXPECT_GE(seconds * 1000 + milliseconds, 29);
+    EXPECT_LT(seconds, 20);
+    EXPECT_GE(timing->GetDiffTime(earlier), 0.025);
+}
+
+TEST(Timing, InstancesAreDistinct) {
+    EXPECT_NE(Timing::Instance().Get(), Timing::Instance().Get());
+}
+
+TEST(PrecisionTime, CarriesAndBorrowsOnce) {
+    EXPECT_EQ(PrecisionTime(1, 600000) + PrecisionTime(2, 500000), PrecisionTime(4, 100000));
+    EXPECT_EQ(PrecisionTime(1, 400000) + PrecisionTime(2, 600000), PrecisionTime(4, 0));
+    EXPECT_EQ(PrecisionTime(1, 400000) + PrecisionTime(2, 599999), PrecisionTime(3, 999999));
+    EXPECT_EQ(PrecisionTime(3, 100000) - PrecisionTime(1, 200000), PrecisionTime(1, 900000));
+    EXPECT_EQ(PrecisionTime(3, 200000) - PrecisionTime(1, 200000), PrecisionTime(2, 0));
+    EXPECT_EQ(PrecisionTime(1, 0) - PrecisionTime(2, 1), PrecisionTime(-2, 999999));
+}
+
+TEST(PrecisionTime, ComparesSecondsThenMicroseconds) {
+    const PrecisionTime a(5, 999999), b(6, 0), c(6, 1);
+    EXPECT_TRUE(a < b && b < c && a <= b && c > a && c >= c && a != b);
+    EXPECT_TRUE(PrecisionTime(-1, 0) < PrecisionTime(0, 0));
+}
+
+TEST(PrecisionTime, SplitsIntoMilliAndMicroseconds) {
+    const PrecisionTime time(2, 123456);
+    EXPECT_EQ(time.GetSeconds(), 2);
+    EXPECT_EQ(time.GetMilliseconds(), 123);
+    EXPECT_EQ(time.GetMicroseconds(), 456);
+}
+
+TEST(PrecisionTime, CopiesOwnTheirValue) {
+    PrecisionTime time(1, 2);
+    PrecisionTime copy(time), assigned;
+    assigned = time;
+    time.Set(3, 4);
+    EXPECT_EQ(copy, PrecisionTime(1, 2));
+    EXPECT_EQ(assigned, PrecisionTime(1, 2));
+}
+
+TEST(PrecisionTime, FromReadingsOfTheClock) {
+    struct Case {
+        const char* name;
+        std::uint64_t frequency, counter;
+        std::uint32_t ticks;
+        PrecisionTime expected;
+    };
+    const std::vector<Case> cases{
+        {"nanoseconds", 1000000000, 1234567891, 0, {1, 234567}},
+        {"truncated, not rounded", 3000000, 2, 0, {0, 0}},
+        {"last before it starts again", 1000000, 4294967295, 0, {4294, 967295}},
+        {"starts again", 1000000, 4294967296, 0, {0, 0}},
+        {"started again many times", 10000000, 3000000000000ULL, 0, {3647, 256576}},
+        {"largest counter", 1, ~0ULL, 0, {0, 0}},
+        {"milliseconds without a counter", 0, 99, 12345, {12, 345000}},
+        {"ticks are signed", 0, 0, 0xFFFFFC17, {-1, -1000}},
+    };
+    for (const Case& row : cases) {
+        PrecisionTime time;
+        time.SetFromReadings(row.frequency, row.counter, row.ticks);
+        if (row.frequency == 1) {
+            EXPECT_LT(time.GetMilliseconds(), 1000) << row.name;  // beyond what a double can tell apart
+        } else {
+            EXPECT_EQ(time, row.expected) << row.name << ": " << time.GetSeconds() << " s";
+        }
+    }
+}
+
+}  // namespace
+}  // namespace Varnholt::DeviceDriver::Generic::Utilities

@@ -1,0 +1,214 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "Platform/CallFilter.h"
+#include "Utilities/Exceptions/Exceptions.h"
+#include "Utilities/Multithreading/Condition.h"
+#include "Utilities/Multithreading/ScopedLock.h"
+
+namespace Varnholt::Utilities::Multithreading {
+namespace {
+
+using namespace std::chrono_literals;
+using Exceptions::ResourceException;
+using testing::StrEq;
+using testing::ThrowsMessage;
+
+constexpr auto ALittle = 30ms;
+
+std::string UniqueName() {
+    return "ostra-condition-test-" +
+           std::to_string(std::chrono::steady_clock::now().time_since_epoch().count());
+}
+
+/// A condition with some threads that wait for it.
+class ConditionTest : public testing::Test {
+  protected:
+    ~ConditionTest() override {
+        Platform::InstallCallFilter({});
+        condition.broadcast();  // lets go whom a failed test has left
+        for (std::thread& thread : threads) {
+            thread.join();
+        }
+    }
+
+    /// Returns once all of them are in `Wait`: they hold the mutex until they are counted there.
+    void StartWaiters(int count) {
+        for (int i = 0; i < count; ++i) {
+            threads.emplace_back([this] {
+                const ScopedLock lock(mutex);
+                ++waiting;
+                try {
+                    condition.Wait(0);
+                } catch (const ResourceException& exception) {
+                    failure = exception.what();
+                    mutex.Lock();  // the scope's unlock finds nothing to unlock otherwise
+                }
+                --waiting;
+                ++woken;
+            });
+        }
+        Await([this, count] { return waiting == count; });
+    }
+
+    template <class State>
+    bool Await(State state) {
+        for (int i = 0; i < 5000; ++i) {
+            {
+                const ScopedLock lock(mutex);
+                if (state()) {
+                    return true;
+                }
+            }
+            std::this_thread::sleep_for(1ms);
+        }
+        ADD_FAILURE() << "waited in vain: " << waiting << " waiting, " << woken << " woken";
+        return false;
+    }
+
+    int Woken() {
+        const ScopedLock lock(mutex);
+        return woken;
+    }
+
+    /// Makes a call fail, on this thread only when others are in the middle of theirs.
+    static void MakeFail(const std::string& name) {
+        Platform::InstallCallFilter([name, failing = std::this_thread::get_id()](std::string_view call) {
+            return call == name && std::this_thread::get_id() == failing ? Platform::Errors::InvalidHandle
+                                                                         : Platform::Errors::Success;
+        });
+    }
+
+    Mutex mutex{UniqueName()};
+    Condition condition{mutex};
+    // Guarded by `mutex`.
+    int waiting = 0;
+    int woken = 0;
+    std::string failure;
+
+  private:
+    std::vector<std::thread> threads;
+};
+
+TEST_F(ConditionTest, SignalWithoutAWaiterIsForgotten) {
+    condition.signal();
+    condition.broadcast();
+    StartWaiters(1);
+    std::this_thread::sleep_for(ALittle);
+    EXPECT_EQ(Woken(), 0);
+    condition.signal();
+    Await([this] { return woken == 1; });
+}
+
+TEST_F(ConditionTest, SignalWakesOne) {
+    StartWaiters(3);
+    for (int expected = 1; expected <= 3; ++expected) {
+        condition.signal();
+        Await([&] { return woken == expected; });
+        std::this_thread::sleep_for(ALittle);
+        EXPECT_EQ(Woken(), expected);
+    }
+}
+
+TEST_F(ConditionTest, BroadcastReturnsWhenAllHaveLeftAndLeavesNothingBehind) {
+    for (int round = 1; round <= 2; ++round) {
+        StartWaiters(3);
+        {
+            const ScopedLock lock(mutex);
+            condition.broadcast();
+            EXPECT_EQ(woken, 3 * (round - 1)) << "the mutex is still held here";
+        }
+        Await([&] { return woken == 3 * round; });
+    }
+    StartWaiters(2);
+    std::this_thread::sleep_for(ALittle);
+    EXPECT_EQ(Woken(), 6) << "no wake-up may be left over";
+    condition.signal();
+    Await([this] { return woken == 7; });
+    std::this_thread::sleep_for(ALittle);
+    EXPECT_EQ(Woken(), 7) << "a signal must not pass for a broadcast";
+    condition.broadcast();
+    Await([this] { return woken == 8; });
+}
+
+TEST_F(ConditionTest, NeedsAMutexWithAName) {
+    Mutex nameless("");
+    Condition refused(nameless);
+    const ScopedLock lock(nameless);
+    EXPECT_THAT(
+        [&] { refused.Wait(0); },
+        ThrowsMessage<ResourceException>(StrEq("Condition::Wait() invalid Mutex! (must be a real mutex)")));
+    refused.broadcast();  // would wait for ever for a waiter that is still counted
+}
+
+TEST_F(ConditionTest, CannotBeMadeWithoutItsObjects) {
+    for (const char* call : {"MakeSemaphore", "MakeAutoResetEvent"}) {
+        MakeFail(call);
+        EXPECT_THAT([&] { const Condition refused(mutex); },
+                    ThrowsMessage<ResourceException>(StrEq("ConditionImpl::ConditionImpl() can't create!")))
+            << call;
+    }
+}
+
+TEST_F(ConditionTest, FailedReleaseUnlocksTheMutexAndKeepsNothingLocked) {
+    struct Case {
+        const char* name;
+        void (Condition::*operation)();
+        const char* message;
+    };
+    StartWaiters(2);
+    for (const Case& row :
+         {Case{"signal", &Condition::signal, "Condition::signal() invalid condition!"},
+          Case{"broadcast", &Condition::broadcast, "Condition::broadcast() unable to release semaphore!"}}) {
+        SCOPED_TRACE(row.name);
+        mutex.Lock();
+        MakeFail("ReleaseSemaphore");
+        EXPECT_THAT([&] { (condition.*row.operation)(); },
+                    ThrowsMessage<ResourceException>(StrEq(row.message)));
+        Platform::InstallCallFilter({});
+        std::thread([&] {
+            EXPECT_TRUE(mutex.TryLock(1000)) << "must have been unlocked";
+            mutex.Unlock();
+        }).join();
+        EXPECT_EQ(Woken(), 0);
+    }
+    std::thread([this] { condition.signal(); }).join();  // another thread gets into the state's own lock
+    Await([this] { return woken == 1; });
+    std::this_thread::sleep_for(ALittle);
+    EXPECT_EQ(Woken(), 1);
+    condition.broadcast();
+    Await([this] { return woken == 2; });
+}
+
+TEST_F(ConditionTest, BroadcastReportsAnEventItCannotWaitFor) {
+    StartWaiters(2);
+    mutex.Lock();
+    MakeFail("Wait");
+    EXPECT_THAT([&] { condition.broadcast(); },
+                ThrowsMessage<ResourceException>(StrEq("Condition::broadcast() invalid event!")));
+    Platform::InstallCallFilter({});
+    Await([this] { return woken == 2; });  // which needs the mutex that the failure has unlocked
+}
+
+TEST_F(ConditionTest, WaiterThatCannotTakeTheMutexAgainSaysSo) {
+    StartWaiters(1);
+    Platform::InstallCallFilter(
+        [waker = std::this_thread::get_id(), done = false](std::string_view call) mutable {
+            if (call != "Wait" || done || std::this_thread::get_id() == waker) {
+                return Platform::Errors::Success;
+            }
+            done = true;
+            return Platform::Errors::InvalidHandle;
+        });
+    condition.signal();
+    Await([this] { return woken == 1; });
+    EXPECT_EQ(failure, "Condition::Wait() invalid mutex! (must be a real mutex)");
+}
+
+}  // namespace
+}  // namespace Varnholt::Utilities::Multithreading

@@ -1,0 +1,229 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <chrono>
+#include <functional>
+#include <future>
+#include <thread>
+#include <typeinfo>
+
+#include "Platform/CallFilter.h"
+#include "Utilities/Exceptions/Exceptions.h"
+#include "Utilities/Multithreading/Mutex.h"
+#include "Utilities/Multithreading/ScopedLock.h"
+
+namespace Varnholt::Utilities::Multithreading {
+namespace {
+
+using namespace std::chrono_literals;
+using Exceptions::InvalidArgumentException;
+using testing::StartsWith;
+using testing::StrEq;
+using testing::ThrowsMessage;
+
+constexpr auto ALittle = 30ms;
+
+/// Runs `body` on another thread and waits for its end.
+template <class Body>
+auto Elsewhere(Body body) {
+    return std::async(std::launch::async, body).get();
+}
+
+std::string UniqueName() {
+    static int count = 0;
+    return "ostra-locks-test-" + std::to_string(std::chrono::steady_clock::now().time_since_epoch().count()) +
+           "-" + std::to_string(++count);
+}
+
+class Locks : public testing::Test {
+  protected:
+    ~Locks() override { Platform::InstallCallFilter({}); }
+
+    static void MakeFail(const std::string& name) {
+        Platform::InstallCallFilter([name](std::string_view call) {
+            return call == name ? Platform::Errors::AccessDenied : Platform::Errors::Success;
+        });
+    }
+};
+
+TEST_F(Locks, MutexIsRecursiveAndNeedsAsManyUnlocks) {
+    for (const std::string& name : {std::string(), UniqueName()}) {
+        SCOPED_TRACE(name);
+        Mutex mutex(name);
+        mutex.Lock();
+        mutex.Lock();
+        std::atomic<bool> acquired = false;
+        std::thread other([&] {
+            const ScopedLock lock(mutex);
+            acquired = true;
+        });
+        std::this_thread::sleep_for(ALittle);
+        EXPECT_FALSE(acquired);
+        mutex.Unlock();
+        std::this_thread::sleep_for(ALittle);
+        EXPECT_FALSE(acquired) << "one of two unlocks must not be enough";
+        mutex.Unlock();
+        other.join();
+        EXPECT_TRUE(acquired);
+    }
+}
+
+TEST_F(Locks, SameNameIsOneLock) {
+    const std::string name = UniqueName();
+    Mutex mutex(name), sameName(name), otherName(UniqueName());
+    const ScopedLock lock(mutex);
+    EXPECT_FALSE(Elsewhere([&] { return sameName.TryLock(0); }));
+    EXPECT_TRUE(Elsewhere([&] {
+        const bool acquired = otherName.TryLock(0);
+        otherName.Unlock();
+        return acquired;
+    }));
+
+    Mutex nameless(""), otherNameless("");
+    const ScopedLock lockNameless(nameless);
+    EXPECT_TRUE(Elsewhere([&] {
+        const ScopedLock lockOther(otherNameless);
+        return true;
+    }));
+}
+
+TEST_F(Locks, CopiesShareOneLockThatLivesWithTheLast) {
+    auto original = std::make_unique<SynchronizationObject>(CreateMutexImpl(UniqueName()));
+    SynchronizationObject copy(*original);
+    original->Lock();
+    EXPECT_FALSE(Elsewhere([&] { return copy.TryLock(0); }));
+    original.reset();
+    copy.Unlock();
+    EXPECT_TRUE(Elsewhere([&] {
+        const bool acquired = copy.TryLock(0);
+        copy.Unlock();
+        return acquired;
+    }));
+}
+
+TEST_F(Locks, TimeoutIsALimitAndNegativeIsNone) {
+    Mutex mutex(UniqueName());
+    for (const int timeout : {-1, -5, std::numeric_limits<int>::min()}) {
+        std::promise<void> held;
+        std::atomic<bool> released = false;
+        std::thread owner([&] {
+            mutex.Lock();
+            held.set_value();
+            std::this_thread::sleep_for(ALittle);
+            released = true;
+            mutex.Unlock();
+        });
+        held.get_future().wait();
+        EXPECT_FALSE(mutex.TryLock(0));
+        EXPECT_FALSE(mutex.TryLock(1));
+        EXPECT_TRUE(mutex.TryLock(timeout));
+        EXPECT_TRUE(released);
+        mutex.Unlock();
+        owner.join();
+    }
+}
+
+TEST_F(Locks, NamelessMutexHasNoTimeouts) {
+    Mutex mutex("");
+    for (const int timeout : {0, 10, -1}) {
+        try {
+            mutex.TryLock(timeout);
+            ADD_FAILURE() << "expected an exception";
+        } catch (const std::exception& exception) {
+            EXPECT_EQ(typeid(exception), typeid(std::runtime_error));
+            EXPECT_STREQ(exception.what(),
+                         "CriticalSection::TryLock: not yet implemented (TryEnterCriitcalSection not exists "
+                         "on  Win9X)");
+        }
+    }
+    EXPECT_TRUE(Elsewhere([&] {
+        const ScopedLock lock(mutex);
+        return true;
+    })) << "the refusal must not lock";
+}
+
+TEST_F(Locks, SemaphoreStartsAtOneAndStopsAtItsMaximum) {
+    for (const std::string& name : {std::string(), UniqueName()}) {
+        SynchronizationObject semaphore(CreateSemaphoreImpl(name, 3));
+        semaphore.Lock();
+        EXPECT_FALSE(semaphore.TryLock(0));
+        EXPECT_FALSE(semaphore.TryLock(1));
+        Elsewhere([&] { semaphore.Unlock(); });
+        EXPECT_TRUE(semaphore.TryLock(0)) << "not bound to a thread";
+        for (int i = 0; i < 5; ++i) {
+            semaphore.Unlock();
+        }
+        for (int i = 0; i < 3; ++i) {
+            EXPECT_TRUE(semaphore.TryLock(0)) << i;
+        }
+        EXPECT_FALSE(semaphore.TryLock(0));
+    }
+    const std::string name = UniqueName();
+    SynchronizationObject semaphore(CreateSemaphoreImpl(name, 1)), sameName(CreateSemaphoreImpl(name, 1));
+    semaphore.Lock();
+    EXPECT_FALSE(sameName.TryLock(0));
+}
+
+TEST_F(Locks, ObjectsThatCannotBeMadeAreRefusedWithTheirPlace) {
+    struct Case {
+        const char* call;
+        std::function<void()> make;
+    };
+    for (const Case& row : {Case{"MakeMutex", [] { Mutex mutex(UniqueName()); }},
+                            Case{"MakeSemaphore", [] { CreateSemaphoreImpl("", 1); }}}) {
+        MakeFail(row.call);
+        try {
+            row.make();
+            ADD_FAILURE() << row.call;
+        } catch (const InvalidArgumentException& exception) {
+            EXPECT_STREQ(exception.what(), "handle is NULL");
+            EXPECT_THAT(
+                exception.GetTrace().front(),
+                StartsWith("::Varnholt::Utilities::Multithreading::Win32Lockable<Varnholt::Utilities::"
+                           "Multithreading::SynchronizationObject::Impl>::Win32Lockable(): "
+                           "\\src\\Utilities/Multithreading/win32/LockableImpl"));
+        }
+    }
+}
+
+TEST_F(Locks, WaitThatFailsIsAnInvalidMutex) {
+    Mutex mutex(UniqueName());
+    MakeFail("Wait");
+    EXPECT_THAT([&] { mutex.TryLock(0); }, ThrowsMessage<InvalidArgumentException>(StrEq("invalid mutex")));
+}
+
+TEST_F(Locks, AbandonedMutexIsReportedOnceAndThenFree) {
+    Mutex mutex(UniqueName());
+    std::thread([&] { mutex.Lock(); }).join();
+    EXPECT_THAT([&] { mutex.TryLock(1000); },
+                ThrowsMessage<InvalidArgumentException>(StrEq("invalid mutex")));
+    EXPECT_TRUE(Elsewhere([&] {
+        const bool acquired = mutex.TryLock(0);
+        mutex.Unlock();
+        return acquired;
+    })) << "whoever was told of a failure does not hold the mutex";
+
+    std::thread([&] { mutex.Lock(); }).join();
+    mutex.Lock();  // does not look at the outcome: acquired all the same
+    EXPECT_FALSE(Elsewhere([&] { return mutex.TryLock(0); }));
+    mutex.Unlock();
+}
+
+TEST_F(Locks, ScopedLockUnlocksWhenItsBlockThrows) {
+    Mutex mutex(UniqueName());
+    EXPECT_THROW(
+        {
+            const ScopedLock lock(mutex);
+            throw 1;
+        },
+        int);
+    EXPECT_TRUE(Elsewhere([&] {
+        const bool acquired = mutex.TryLock(0);
+        mutex.Unlock();
+        return acquired;
+    }));
+}
+
+}  // namespace
+}  // namespace Varnholt::Utilities::Multithreading
