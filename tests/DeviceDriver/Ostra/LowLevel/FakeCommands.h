@@ -1,0 +1,52 @@
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <functional>
+#include <ostream>
+#include <string>
+#include <vector>
+
+#include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+
+using Bytes = std::vector<std::uint8_t>;
+
+/// One command as it reached the fake; for commands other than EEPROM ones `address` and `size` are 0 or the
+/// command's numbers.
+struct Command {
+    std::string name;
+    std::uint32_t address = 0;
+    std::uint32_t size = 0;
+    bool operator==(const Command&) const = default;
+};
+void PrintTo(const Command& command, std::ostream* stream);
+
+/// What the fake instrument keeps, and how it misbehaves; owned by the test.
+struct FakeInstrument {
+    Bytes eeprom;
+    std::vector<Command> commands;
+
+    std::uint16_t p1 = 0, p2 = 0, p3 = 0;
+    std::uint8_t p4 = 0, p5 = 0;
+    std::uint8_t misc1 = 0, misc3 = 0;
+    std::uint16_t misc2 = 0, misc4 = 0, misc5 = 0;
+    std::uint8_t mode = 0;
+    /// The six answers to `GetMeasureMode` in the current mode.
+    std::function<std::array<std::uint8_t, 6>(std::uint8_t mode)> describeMode;
+
+    /// The command with this index fails with `IOException`; a write has then written this part of its bytes.
+    std::size_t failingCommand = ~std::size_t{0};
+    std::uint32_t bytesWrittenByFailure = 0;
+
+    std::vector<Command> TakeCommands();
+};
+
+/// A command set whose transport is the fake; its opening reset is not among the commands.
+Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionality> Open(FakeInstrument& instrument);
+
+/// The EEPROM of a fresh instrument: table, default values, both logs zero.
+Bytes FreshImage();
+
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

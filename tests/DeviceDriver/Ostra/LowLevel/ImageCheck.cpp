@@ -1,0 +1,109 @@
+#include "ImageCheck.h"
+
+#include <stdexcept>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
+#include "FakeCommands.h"
+#include "Protocol/EepromMap.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+
+namespace EepromMap = Protocol::EepromMap;
+using Generic::Configuration::Properties;
+using Generic::Utilities::DataException;
+using Varnholt::Utilities::Exceptions::ResourceException;
+
+namespace {
+
+bool IsUnknownIdentifier(const ResourceException& exception) {
+    const std::string text = exception.what();
+    return text.starts_with("id ") && text.ends_with(" doesn't exist");
+}
+
+/// False when `action` was refused with an exception that is documented for it.
+template <class Action>
+bool Succeeds(const char* what, Action action) {
+    try {
+        action();
+        return true;
+    } catch (const DataException& exception) {
+        if (std::string(exception.what()) == PellandoEAT::CorruptTable) {
+            return false;
+        }
+        throw std::logic_error(std::string(what) + ": " + exception.what());
+    } catch (const ResourceException& exception) {
+        if (IsUnknownIdentifier(exception) ||
+            std::string(exception.what()) == "Configuration data dump target too small") {
+            return false;
+        }
+        throw std::logic_error(std::string(what) + ": " + exception.what());
+    }
+}
+
+Bytes BytesOf(PellandoEEPROM& eeprom, const char* section) {
+    Properties set(section);
+    eeprom.Load(set);
+    Bytes bytes(set.SizeOf(false));
+    set.Dump(bytes.begin(), bytes.end(), false, true);
+    return bytes;
+}
+
+struct Values {
+    Bytes calibration, log;
+    bool operator==(const Values&) const = default;
+};
+
+Values ValuesOf(PellandoEEPROM& eeprom) {
+    return {BytesOf(eeprom, "CalibrationData"), BytesOf(eeprom, "LogData")};
+}
+
+Values ValuesIn(const Bytes& image) {
+    FakeInstrument instrument{.eeprom = image, .commands = {}, .describeMode = {}};
+    PellandoEEPROM eeprom(Open(instrument));
+    return ValuesOf(eeprom);
+}
+
+/// Whether an image must have a readable second copy of the log: its table has every entry of it.
+bool HasSecondLog(PellandoEEPROM& eeprom) {
+    Properties table("EATData"), log("LogData");
+    eeprom.Load(table);
+    eeprom.Load(log);
+    for (const auto& entry : log.GetDatastore()) {
+        if (!table.Contains(static_cast<std::uint16_t>(entry.first + EepromMap::LogCopyIdOffset))) {
+            return false;
+        }
+    }
+    return true;
+}
+
+}  // namespace
+
+ImageOutcome CheckImage(const Bytes& image) {
+    FakeInstrument instrument{.eeprom = image, .commands = {}, .describeMode = {}};
+    const auto functionality = Open(instrument);
+    Varnholt::Utilities::Tools::SmartPointer<PellandoEEPROM> eeprom;
+    if (!Succeeds("load", [&] {
+            eeprom =
+                Varnholt::Utilities::Tools::SmartPointer<PellandoEEPROM>(new PellandoEEPROM(functionality));
+        })) {
+        return ImageOutcome::Refused;
+    }
+    Bytes dumped;
+    if (!Succeeds("dump", [&] { dumped = eeprom->Dump(); })) {
+        return ImageOutcome::DumpRefused;
+    }
+    const Values expected = ValuesOf(*eeprom);  // behind the dump, which renews the checksum
+    if (ValuesIn(dumped) != expected) {
+        throw std::logic_error("the dump reads differently");
+    }
+    if (HasSecondLog(*eeprom)) {
+        dumped[EepromMap::MainLog] = static_cast<std::uint8_t>(~dumped[EepromMap::MainLog]);
+        if (ValuesIn(dumped) != expected) {
+            throw std::logic_error("the dump's second log reads differently");
+        }
+    }
+    return ImageOutcome::RoundTripRight;
+}
+
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -1,0 +1,54 @@
+#include <gtest/gtest.h>
+
+#include <array>
+#include <iostream>
+#include <random>
+
+#include "FakeCommands.h"
+#include "ImageCheck.h"
+#include "Protocol/EepromMap.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+namespace {
+
+namespace EepromMap = Protocol::EepromMap;
+
+/// A fresh image with random bytes changed, most of them where the image describes itself.
+Bytes MutatedImage(const Bytes& fresh, std::uint32_t seed) {
+    std::minstd_rand random(seed + 1);
+    const auto below = [&random](std::uint32_t limit) {
+        return static_cast<std::uint32_t>(random() % limit);
+    };
+    Bytes image = fresh;
+    const std::uint32_t changes = 1 + below(below(4) == 0 ? 64 : 4);
+    for (std::uint32_t i = 0; i < changes; ++i) {
+        const std::uint32_t usedTable = 334;
+        const std::uint32_t position =
+            below(4) == 0 ? below(Protocol::EepromSize) : EepromMap::Table + below(usedTable);
+        // Small steps lead to tables that are nearly right, which random bytes hardly ever are.
+        const std::uint32_t value = below(2) == 0 ? below(256) : image[position] + 4 * below(4);
+        image[position] = static_cast<std::uint8_t>(value);
+    }
+    return image;
+}
+
+TEST(MutatedImages, GiveAModelThatRoundTripsOrADocumentedException) {
+    const Bytes fresh = FreshImage();
+    ASSERT_EQ(CheckImage(fresh), ImageOutcome::RoundTripRight);
+    std::array<int, 3> outcomes{};
+    for (std::uint32_t seed = 0; seed < OSTRA_MUTATED_IMAGES; ++seed) {
+        try {
+            ++outcomes[static_cast<std::size_t>(CheckImage(MutatedImage(fresh, seed)))];
+        } catch (const std::exception& exception) {
+            FAIL() << "image " << seed << ": " << exception.what();
+        }
+    }
+    std::cout << OSTRA_MUTATED_IMAGES << " images: " << outcomes[0] << " refused, " << outcomes[1]
+              << " loaded but not to be dumped, " << outcomes[2] << " round trips\n";
+    for (const int outcome : outcomes) {
+        EXPECT_GT(outcome, OSTRA_MUTATED_IMAGES / 100) << "the images must reach every outcome";
+    }
+}
+
+}  // namespace
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -1,0 +1,329 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <map>
+#include <utility>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoEAT.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoLog.h"
+#include "DeviceDriver/Ostra/LowLevel/SectionReader.h"
+#include "FakeCommands.h"
+#include "Protocol/ByteOrder.h"
+#include "Protocol/EepromMap.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+namespace {
+
+namespace EepromMap = Protocol::EepromMap;
+using namespace Generic::Configuration;
+using Generic::Utilities::DataException;
+using testing::StrEq;
+using testing::ThrowsMessage;
+using Varnholt::Utilities::Exceptions::ResourceException;
+using Entries = std::vector<std::pair<std::uint16_t, std::int32_t>>;
+using Longs = std::vector<std::int32_t>;
+
+constexpr const char* Corrupt = "corrupt EAT detected!!";
+
+/// The 55 entries of a fresh instrument.
+const Entries Fresh{
+    {10000, 0},    {10001, 4},    {10002, 8},    {10003, 12},   {10004, 16},   {10005, 20},   {10010, 24},
+    {10011, 536},  {10012, 1048}, {10013, 1052}, {10020, 1056}, {10021, 1060}, {1, 1064},     {11000, 2048},
+    {11001, 2052}, {11002, 2056}, {11003, 2060}, {11004, 2064}, {11005, 2068}, {11010, 2072}, {11011, 2584},
+    {11012, 3096}, {11013, 3100}, {11020, 3104}, {11021, 3108}, {3, 3112},     {1000, 4608},  {1001, 4616},
+    {1002, 4624},  {1003, 4632},  {1004, 4640},  {3001, 4648},  {1100, 4652},  {1101, 4660},  {3002, 4668},
+    {1102, 4672},  {1221, 4680},  {1222, 4684},  {1204, 4688},  {1205, 4692},  {1207, 4696},  {1208, 4700},
+    {1213, 4704},  {1211, 4708},  {4000, 4712},  {1212, 4716},  {3007, 4720},  {3014, 4724},  {3008, 4728},
+    {3009, 4732},  {3010, 4740},  {3011, 4744},  {3012, 4748},  {3013, 4752},  {2, 4756}};
+
+Bytes TableBytes(std::uint16_t version, std::uint16_t length, const Entries& entries) {
+    Bytes bytes(EepromMap::TableArea, 0xFF);
+    Protocol::StoreBig16(&bytes[0], version);
+    Protocol::StoreBig16(&bytes[2], length);
+    std::size_t offset = 4;
+    for (const auto& [id, address] : entries) {
+        Protocol::StoreBig16(&bytes[offset], id);
+        Protocol::StoreBig32(&bytes[offset + 2], static_cast<std::uint32_t>(address));
+        offset += 6;
+    }
+    return bytes;
+}
+
+Entries EntriesOf(const PellandoEAT& table) {
+    Entries entries;
+    for (const auto& [id, address] : table.GetDatastore().GetDatastore()) {
+        entries.emplace_back(id, address.AsLong());
+    }
+    return entries;
+}
+
+class FreshTable : public testing::Test {
+  protected:
+    FreshTable() { table.InitializeEmtpyEAT(); }
+    PellandoEAT table;
+};
+
+TEST_F(FreshTable, IsTheOneOfAFreshInstrumentByteForByte) {
+    EXPECT_EQ(EntriesOf(table), Fresh);
+    Bytes dumped(EepromMap::TableArea, 0xFF);
+    table.Dump(dumped.begin(), dumped.end());
+    EXPECT_EQ(dumped, TableBytes(1, 334, Fresh));
+    EXPECT_EQ(EntriesOf(PellandoEAT(dumped.begin())), Fresh);
+}
+
+TEST_F(FreshTable, SizeIsTheDistanceToTheNextEntry) {
+    const std::pair<std::uint16_t, std::int32_t> sizes[] = {{10000, 4}, {10010, 512}, {10021, 4}, {11021, 4},
+                                                            {3013, 4},  {3009, 8},    {1000, 8}};
+    for (const auto& [id, size] : sizes) {
+        EXPECT_EQ(table.SizeOf(id), size) << id;
+    }
+    EXPECT_THAT([&] { table.SizeOf(5); }, ThrowsMessage<ResourceException>(StrEq("id 5 doesn't exist")));
+    EXPECT_THAT([&] { table.AddressOf(5); }, ThrowsMessage<ResourceException>(StrEq("id 5 doesn't exist")));
+    EXPECT_THAT([&] { table.SizeOf(2); }, ThrowsMessage<ResourceException>(StrEq("id 2 doesn't exist")))
+        << "nothing says where the last entry ends";
+}
+
+TEST_F(FreshTable, LogAreaEndsBelow4096) {
+    EXPECT_TRUE(table.IsEntryInLogArea(10021, 4));
+    EXPECT_TRUE(table.IsEntryInLogArea(11021, 4095 - 3108));
+    EXPECT_FALSE(table.IsEntryInLogArea(11021, 4096 - 3108));
+    EXPECT_FALSE(table.IsEntryInLogArea(1000, 4));
+    EXPECT_FALSE(table.IsEntryInLogArea(10000, 0xFFFFFFFF));
+}
+
+TEST(PellandoEAT, HeaderDecidesWhetherAndHowFarTheTableIsRead) {
+    struct Case {
+        std::uint16_t version, length;
+        std::size_t entries;  ///< 0: refused
+    };
+    Entries many;
+    for (std::uint16_t i = 0; i < 84; ++i) {
+        many.emplace_back(static_cast<std::uint16_t>(100 + i), i);
+    }
+    for (const Case& row :
+         {Case{1, 334, 55}, Case{0, 334, 0}, Case{2, 334, 0}, Case{0x0100, 334, 0}, Case{1, 0, 0},
+          Case{1, 299, 0}, Case{1, 300, 50}, Case{1, 304, 50}, Case{1, 305, 51}, Case{1, 508, 84},
+          Case{1, 511, 84}, Case{1, 512, 84}, Case{1, 513, 0}, Case{1, 0xFFFF, 0}}) {
+        SCOPED_TRACE(testing::Message() << "version " << row.version << ", length " << row.length);
+        const Bytes bytes = TableBytes(row.version, row.length, many);
+        PellandoEAT table;
+        table.InitializeEmtpyEAT();
+        if (row.entries == 0) {
+            EXPECT_THAT([&] { table.ParseBuffer(bytes.data()); },
+                        ThrowsMessage<DataException>(StrEq(Corrupt)));
+            EXPECT_THAT([&] { PellandoEAT{bytes.begin()}; }, ThrowsMessage<DataException>(StrEq(Corrupt)));
+            EXPECT_EQ(EntriesOf(table), Fresh);
+        } else {
+            table.ParseBuffer(bytes.data());
+            EXPECT_EQ(EntriesOf(table),
+                      Entries(many.begin(), many.begin() + static_cast<std::ptrdiff_t>(row.entries)));
+        }
+    }
+}
+
+TEST(PellandoEAT, RepeatedIdentifierKeepsItsPlaceAndTakesTheLastAddress) {
+    Entries entries = Fresh;
+    entries[20] = {10001, -7};
+    const Bytes bytes = TableBytes(1, 334, entries);
+    const PellandoEAT table(bytes.begin());
+    EXPECT_EQ(table.GetDatastore().GetItemCount(), 54U);
+    EXPECT_EQ(EntriesOf(table)[1], (Entries::value_type{10001, -7}));
+}
+
+TEST(PellandoEAT, DumpNeedsRoomForHeaderAndEntries) {
+    PellandoEAT table;
+    table.InitializeEmtpyEAT();
+    constexpr const char* tooSmall = "Configuration data dump target too small";
+    Bytes bytes(333, 0xAA);
+    EXPECT_THAT([&] { table.Dump(bytes.begin(), bytes.end()); },
+                ThrowsMessage<ResourceException>(StrEq(tooSmall)));
+    EXPECT_EQ(Bytes(bytes.begin(), bytes.begin() + 5), (Bytes{0, 1, 0x01, 0x4E, 0xAA})) << "header only";
+    EXPECT_THAT([&] { table.Dump(bytes.begin(), bytes.begin() + 3); },
+                ThrowsMessage<ResourceException>(StrEq(tooSmall)));
+}
+
+TEST(PellandoEAT, DefaultSetsAreMadeOnce) {
+    const Properties& log = PellandoEAT::GetDefaultLogData();
+    const Properties& calibration = PellandoEAT::GetDefaultCalibrationData();
+    EXPECT_EQ(&PellandoEAT::GetDefaultLogData(), &log);
+    EXPECT_EQ(&PellandoEAT::GetDefaultCalibrationData(), &calibration);
+    EXPECT_EQ(log.GetName(), "LogData");
+    EXPECT_EQ(calibration.GetName(), "CalibrationData");
+    EXPECT_EQ(log.GetItemCount(), 12U);
+    EXPECT_EQ(calibration.GetItemCount(), 28U);
+    EXPECT_EQ(log.SizeOf(true), 1064U);
+    EXPECT_EQ(calibration.SizeOf(true), 148U);
+    EXPECT_EQ(calibration.GetProperty(1002).AsLongVector(), (Longs{-1, -1}));
+    EXPECT_EQ(calibration.GetProperty(1000).AsFloatVector(), (std::vector<float>{-1, -1}));
+    EXPECT_EQ(calibration.GetProperty(1213).AsFloat(), -1);
+    EXPECT_EQ(calibration.GetProperty(4000).AsLong(), -1);
+}
+
+/// The entries whose addresses differ from those of a fresh table, with the difference.
+std::map<int, int> MovedEntries(const PellandoEAT& table) {
+    std::map<int, int> moved;
+    const Entries now = EntriesOf(table);
+    for (std::size_t i = 0; i < Fresh.size(); ++i) {
+        EXPECT_EQ(now[i].first, Fresh[i].first) << "the order must stay";
+        if (now[i].second != Fresh[i].second) {
+            moved[now[i].first] = now[i].second - Fresh[i].second;
+        }
+    }
+    return moved;
+}
+
+TEST_F(FreshTable, EnsureConsistencyMovesWhatLiesBehindAndTheSectionEnd) {
+    struct Case {
+        const char* name;
+        std::map<std::uint16_t, std::size_t> elements;
+        std::map<int, int> moved;
+    };
+    const Case cases[] = {
+        {"nothing changed", {}, {}},
+        {"one longer", {{3009, 3}}, {{3010, 4}, {3011, 4}, {3012, 4}, {3013, 4}, {2, 4}}},
+        {"one shorter", {{3009, 1}}, {{3010, -4}, {3011, -4}, {3012, -4}, {3013, -4}, {2, -4}}},
+        {"the last one longer", {{3013, 3}}, {{2, 8}}},
+        {"two that make up for each other", {{3009, 3}, {3011, 0}}, {{3010, 4}, {3011, 4}}},
+        {"two longer", {{3011, 2}, {3013, 2}}, {{3012, 4}, {3013, 4}, {2, 8}}},
+    };
+    for (const Case& row : cases) {
+        SCOPED_TRACE(row.name);
+        PellandoEAT fresh;
+        fresh.InitializeEmtpyEAT();
+        Properties set = PellandoEAT::GetDefaultCalibrationData();
+        for (const auto& [id, count] : row.elements) {
+            set.SetProperty(id, Property(Longs(count)));
+        }
+        fresh.EnsureConsistency(set);
+        EXPECT_EQ(MovedEntries(fresh), row.moved);
+        for (const auto& [id, value] : set.GetDatastore()) {
+            EXPECT_EQ(fresh.SizeOf(id), static_cast<std::int32_t>(value.SizeOf())) << id;
+        }
+        fresh.EnsureConsistency(set);
+        EXPECT_EQ(MovedEntries(fresh), row.moved) << "a second call must find nothing to do";
+        fresh.EnsureConsistency(PellandoEAT::GetDefaultCalibrationData());
+        EXPECT_EQ(EntriesOf(fresh), Fresh) << "and the way back must be open";
+    }
+}
+
+TEST_F(FreshTable, EnsureConsistencyOfALogMovesBothCopies) {
+    const Bytes image = FreshImage();
+    PellandoLog log(table, image.begin());
+    log.SetItem(10012, Property(Longs{1, 2, 3}));
+    table.EnsureConsistency(log);
+    EXPECT_EQ(MovedEntries(table),
+              (std::map<int, int>{
+                  {10013, 8}, {10020, 8}, {10021, 8}, {1, 8}, {11013, 8}, {11020, 8}, {11021, 8}, {3, 8}}));
+}
+
+TEST_F(FreshTable, EnsureConsistencyThatFailsChangesNothing) {
+    Properties set;
+    set.SetProperty(1000, Property(Longs{1, 2, 3}));
+    set.SetProperty(1001, Property(Longs{1, 2, 3}));
+    set.SetProperty(77, Property(std::int32_t{1}));
+    EXPECT_THAT([&] { table.EnsureConsistency(set); },
+                ThrowsMessage<ResourceException>(StrEq("id 77 doesn't exist")));
+    EXPECT_EQ(EntriesOf(table), Fresh);
+
+    const Bytes image = FreshImage();
+    PellandoLog log(table, image.begin());
+    log.SetItem(10001, Property(Longs{1, 2}));
+    log.SetItem(10100, Property(std::int32_t{1}));
+    EXPECT_THAT([&] { table.EnsureConsistency(log); },
+                ThrowsMessage<ResourceException>(StrEq("id 10100 doesn't exist")));
+    EXPECT_EQ(EntriesOf(table), Fresh);
+}
+
+TEST_F(FreshTable, AddressesBeyond32BitsAreCorrupt) {
+    table.GetDatastore().GetProperty(1001).Assign(std::int32_t{-2147483647});
+    table.GetDatastore().GetProperty(1002).Assign(std::int32_t{2147483647});
+    EXPECT_THAT([&] { table.SizeOf(1001); }, ThrowsMessage<DataException>(StrEq(Corrupt)));
+    Properties set;
+    set.SetProperty(1000, Property(Longs{1, 2, 3}));
+    set.SetProperty(1002, Property(Longs{1, 2}));
+    const Entries before = EntriesOf(table);
+    EXPECT_THAT([&] { table.EnsureConsistency(set); }, ThrowsMessage<DataException>(StrEq(Corrupt)));
+    EXPECT_EQ(EntriesOf(table), before);
+}
+
+TEST_F(FreshTable, SectionReaderReadsACopyUnderItsOwnIdentifiers) {
+    Bytes image = FreshImage();
+    Protocol::StoreBig32(&image[8], 0x01020304);
+    Protocol::StoreBig32(&image[2056], 0x05060708);
+    const SectionReader readLog(table, &ConfigurationDataConverter::IsLogParameter);
+    const Properties main = readLog(image.data(), 0);
+    const Properties copy = readLog(image.data(), 1000);
+    EXPECT_EQ(main.GetProperty(10002).AsLong(), 0x01020304);
+    EXPECT_EQ(copy.GetProperty(10002).AsLong(), 0x05060708);
+    EXPECT_EQ(copy.GetPropertyKeys(), PellandoEAT::GetDefaultLogData().GetPropertyKeys());
+    const SectionReader readCalibration(table, &ConfigurationDataConverter::IsCalibrationParameter);
+    EXPECT_EQ(readCalibration(image.data(), 0).GetPropertyKeys(),
+              PellandoEAT::GetDefaultCalibrationData().GetPropertyKeys());
+}
+
+TEST(SectionReader, FollowsTheTableWhereItCanBeUsedAndRefusesItWhereNot) {
+    struct Case {
+        const char* name;
+        std::int32_t address, next;  ///< of 3010 and of the entry behind it
+        std::size_t elements;        ///< read for 3010; ~0: refused
+    };
+    constexpr std::size_t refused = ~std::size_t{0};
+    constexpr std::int32_t lowest = std::numeric_limits<std::int32_t>::min();
+    constexpr std::int32_t highest = std::numeric_limits<std::int32_t>::max();
+    for (const Case& row : {
+             Case{"as usual", 4740, 4744, 1},
+             Case{"elsewhere", 0, 4, 1},
+             Case{"longer than usual", 4740, 4752, 3},
+             Case{"empty", 4740, 4740, 0},
+             Case{"empty at the end", 8192, 8192, 0},
+             Case{"up to the last byte", 8188, 8192, 1},
+             Case{"whole image", 0, 8192, 2048},
+             Case{"beyond the last byte", 8188, 8196, refused},
+             Case{"across the end", 8190, 8194, refused},
+             Case{"behind the image", 8193, 8197, refused},
+             Case{"before the image", -4, 0, refused},
+             Case{"backwards", 4744, 4740, refused},
+             Case{"no whole element", 4740, 4743, refused},
+             Case{"half an element too many", 4740, 4746, refused},
+             Case{"far behind", highest, highest, refused},
+             Case{"far before", lowest, lowest, refused},
+             Case{"farthest apart", lowest, highest, refused},
+             Case{"farthest apart backwards", highest, lowest, refused},
+             Case{"size that wraps to a plausible one", lowest, lowest + 4, refused},
+         }) {
+        SCOPED_TRACE(row.name);
+        PellandoEAT table;
+        table.CreateSection({}, static_cast<std::uint32_t>(row.address), 3010, 0);
+        table.CreateSection({}, static_cast<std::uint32_t>(row.next), 2, 0);
+        const Bytes image = FreshImage();
+        const SectionReader read(table, &ConfigurationDataConverter::IsCalibrationParameter);
+        if (row.elements == refused) {
+            EXPECT_THAT([&] { read(image.data(), 0); }, ThrowsMessage<DataException>(StrEq(Corrupt)));
+        } else {
+            const Properties section = read(image.data(), 0);
+            EXPECT_EQ(section.GetProperty(3010).AsLongVector().size(), row.elements);
+            EXPECT_EQ(section.GetProperty(3010).GetType(), TypeLong);
+        }
+    }
+}
+
+TEST(SectionReader, RefusesWhatTheTableDoesNotSay) {
+    const Bytes image = FreshImage();
+    PellandoEAT lastHasNoEnd;
+    lastHasNoEnd.CreateSection({}, 4608, 3010, 0);
+    const SectionReader readCalibration(lastHasNoEnd, &ConfigurationDataConverter::IsCalibrationParameter);
+    EXPECT_THAT([&] { readCalibration(image.data(), 0); },
+                ThrowsMessage<ResourceException>(StrEq("id 3010 doesn't exist")));
+
+    PellandoEAT withoutCopy;
+    withoutCopy.CreateSection(PellandoEAT::GetDefaultLogData(), 0, 1, 0);
+    const SectionReader readLog(withoutCopy, &ConfigurationDataConverter::IsLogParameter);
+    EXPECT_EQ(readLog(image.data(), 0).GetItemCount(), 12U);
+    EXPECT_THAT([&] { readLog(image.data(), 1000); },
+                ThrowsMessage<ResourceException>(StrEq("id 11000 doesn't exist")));
+}
+
+}  // namespace
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -1,0 +1,372 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <string>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
+#include "FakeCommands.h"
+#include "Protocol/ByteOrder.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+namespace {
+
+using namespace Generic::Configuration;
+using Generic::Utilities::DataException;
+using Generic::Utilities::IOException;
+using testing::ElementsAre;
+using testing::ElementsAreArray;
+using testing::IsEmpty;
+using testing::StrEq;
+using testing::ThrowsMessage;
+using Varnholt::Utilities::Exceptions::ResourceException;
+using Varnholt::Utilities::Exceptions::RuntimeException;
+using Longs = std::vector<std::int32_t>;
+
+const std::vector<Command> LogWrites{{"WriteEEPROM", 0, 256},    {"WriteEEPROM", 256, 256},
+                                     {"WriteEEPROM", 512, 256},  {"WriteEEPROM", 768, 256},
+                                     {"WriteEEPROM", 1024, 40},  {"WriteEEPROM", 2048, 256},
+                                     {"WriteEEPROM", 2304, 256}, {"WriteEEPROM", 2560, 256},
+                                     {"WriteEEPROM", 2816, 256}, {"WriteEEPROM", 3072, 40}};
+
+Property Long(std::int32_t value) {
+    return Property(value);
+}
+
+class EepromTest : public testing::Test {
+  protected:
+    EepromTest() { instrument.eeprom = FreshImage(); }
+
+    void Load() {
+        eeprom = std::make_unique<PellandoEEPROM>(Open(instrument));
+        instrument.TakeCommands();
+    }
+    void Store(std::initializer_list<std::pair<std::uint16_t, std::int32_t>> values) {
+        set = Properties();
+        for (const auto& [id, value] : values) {
+            set.SetProperty(id, Long(value));
+        }
+        eeprom->Store(set);
+    }
+
+    FakeInstrument instrument;
+    std::unique_ptr<PellandoEEPROM> eeprom;
+    Properties set;
+};
+
+TEST_F(EepromTest, IsReadInTwoHalvesAndThenServedFromMemory) {
+    Protocol::StoreBig32(&instrument.eeprom[4712], 4711);
+    eeprom = std::make_unique<PellandoEEPROM>(Open(instrument));
+    EXPECT_THAT(instrument.TakeCommands(),
+                ElementsAre(Command{"ReadEEPROM", 0, 4096}, Command{"ReadEEPROM", 4096, 4096}));
+    EXPECT_EQ(eeprom->Load(4000).AsLong(), 4711);
+    EXPECT_EQ(eeprom->Load(10010).AsLongVector(), Longs(128, 0));
+    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+    for (const std::uint16_t id : std::vector<std::uint16_t>{2009, 5, 11000, 10100, 20001, 20002, 65535}) {
+        EXPECT_THAT([&] { eeprom->Load(id); },
+                    ThrowsMessage<ResourceException>(StrEq("unknown property id = " + std::to_string(id))));
+    }
+}
+
+TEST_F(EepromTest, CannotBeBuiltFromWhatCannotBeUsed) {
+    Protocol::StoreBig16(&instrument.eeprom[4096], 2);
+    EXPECT_THAT([&] { PellandoEEPROM broken(Open(instrument)); },
+                ThrowsMessage<DataException>(StrEq("corrupt EAT detected!!")));
+    EXPECT_EQ(instrument.TakeCommands().size(), 2U) << "nothing may be written";
+    instrument.eeprom = FreshImage();
+    for (const std::size_t command : {0U, 1U}) {
+        instrument.failingCommand = command;
+        EXPECT_THAT([&] { PellandoEEPROM broken(Open(instrument)); }, testing::Throws<IOException>());
+        EXPECT_EQ(instrument.TakeCommands().size(), command + 1);
+    }
+}
+
+TEST_F(EepromTest, LoadFillsSetsByNameOrByIdentifier) {
+    Load();
+    struct Case {
+        const char* name;
+        std::size_t entries;
+        std::uint16_t first, last;
+    };
+    for (const Case& row : {Case{"CalibrationData", 28, 1000, 3013}, Case{"LogData", 12, 10000, 10021},
+                            Case{"EATData", 55, 10000, 2}}) {
+        Properties named(row.name);
+        EXPECT_EQ(&eeprom->Load(named), &named);
+        ASSERT_EQ(named.GetItemCount(), row.entries) << row.name;
+        EXPECT_EQ(named.GetPropertyKeys().front(), row.first);
+        EXPECT_EQ(named.GetPropertyKeys().back(), row.last);
+    }
+    for (const char* other : {"", "calibrationdata", "CalibrationData "}) {
+        Properties named(other);
+        EXPECT_EQ(eeprom->Load(named).GetItemCount(), 0U) << other;
+    }
+    Properties some("CalibrationData");
+    some.SetProperty(2005, Long(7));
+    some.SetProperty(3009, Property());
+    eeprom->Load(some);
+    EXPECT_EQ(some.GetItemCount(), 2U);
+    EXPECT_EQ(some.GetProperty(2005).AsLong(), 7);
+    EXPECT_EQ(some.GetProperty(3009).AsLongVector(), (Longs{-1, -1}));
+    some.SetProperty(20001, Long(1));
+    EXPECT_THAT([&] { eeprom->Load(some); },
+                ThrowsMessage<ResourceException>(StrEq("unknown property id = 20001")));
+}
+
+TEST_F(EepromTest, StoreObeysItsRequests) {
+    struct Case {
+        const char* name;
+        std::initializer_list<std::pair<std::uint16_t, std::int32_t>> values;
+        bool writesLog;
+        std::int32_t writeThroughAfterwards;  ///< 20001 in the caller's set; -1: not in it
+    };
+    Load();
+    for (const Case& row : {
+             Case{"nothing of the EEPROM", {{2005, 1}}, false, -1},
+             Case{"a value", {{1211, 5}}, false, -1},
+             Case{"write through", {{1211, 5}, {20001, 1}}, true, 0},
+             Case{"write through alone", {{20001, 1}}, true, 0},
+             Case{"not quite write through", {{20001, 2}}, false, 2},
+             Case{"dump", {{20002, 1}}, true, -1},
+             Case{"dump wins over write through", {{20001, 1}, {20002, 1}}, true, 1},
+             Case{"no dump but write through", {{20001, 1}, {20002, 0}}, true, 0},
+         }) {
+        SCOPED_TRACE(row.name);
+        Store(row.values);
+        EXPECT_THAT(instrument.TakeCommands(),
+                    ElementsAreArray(row.writesLog ? LogWrites : std::vector<Command>()));
+        EXPECT_EQ(set.Contains(20001) ? set.GetProperty(20001).AsLong() : -1, row.writeThroughAfterwards);
+        EXPECT_THAT([&] { eeprom->Lock(); },
+                    ThrowsMessage<ResourceException>(StrEq("EEPROM already locked")));
+    }
+    EXPECT_EQ(eeprom->Load(1211).AsLong(), 5);
+    EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[4708]), 0xFFFFFFFF)
+        << "calibration changes in memory only";
+}
+
+TEST_F(EepromTest, LogValuesReachBothCopies) {
+    Load();
+    Store({{10002, 5}, {20002, 1}});
+    for (const std::size_t copy : {0U, 2048U}) {
+        EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[copy]), 5U);
+        EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[copy + 8]), 5U);
+    }
+}
+
+TEST_F(EepromTest, FailedWriteThroughLocksAgain) {
+    Load();
+    instrument.failingCommand = 0;
+    EXPECT_THAT([&] { Store({{20001, 1}}); }, testing::Throws<IOException>());
+    EXPECT_THAT([&] { eeprom->Lock(); }, ThrowsMessage<ResourceException>(StrEq("EEPROM already locked")));
+}
+
+TEST_F(EepromTest, LockGuardsWriteThrough) {
+    Load();
+    EXPECT_THAT([&] { eeprom->Lock(); }, ThrowsMessage<ResourceException>(StrEq("EEPROM already locked")));
+    EXPECT_THAT([&] { eeprom->WriteThrough(); },
+                ThrowsMessage<ResourceException>(StrEq("EEPROM access denied")));
+    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+    eeprom->Unlock();
+    EXPECT_THAT([&] { eeprom->Unlock(); },
+                ThrowsMessage<ResourceException>(StrEq("EEPROM already unlocked")));
+    eeprom->WriteThrough();
+    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
+}
+
+TEST_F(EepromTest, DueLogIsWrittenBeforeTheNextChange) {
+    Load();
+    for (int change = 1; change <= 20; ++change) {
+        eeprom->SetProperty(10002, Long(change));
+    }
+    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+    eeprom->GetLog();
+    eeprom->GetLog(false);
+    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+    eeprom->SetProperty(10002, Long(21));
+    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
+    EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[8]), 20U) << "the change comes behind the dump";
+    EXPECT_EQ(eeprom->Load(10002).AsLong(), 21);
+}
+
+TEST_F(EepromTest, BinaryAreasAreWrittenAndReadDirectly) {
+    Load();
+    Bytes block(1904);
+    for (std::size_t i = 0; i < block.size(); ++i) {
+        block[i] = static_cast<std::uint8_t>(i * 7);
+    }
+    eeprom->StoreBinary(10100, block);
+    EXPECT_THAT(instrument.TakeCommands(),
+                ElementsAre(Command{"WriteEEPROM", 1064, 256}, Command{"WriteEEPROM", 1320, 256},
+                            Command{"WriteEEPROM", 1576, 256}, Command{"WriteEEPROM", 1832, 216},
+                            Command{"WriteEEPROM", 3112, 256}, Command{"WriteEEPROM", 3368, 256},
+                            Command{"WriteEEPROM", 3624, 256}, Command{"WriteEEPROM", 3880, 152}));
+    EXPECT_EQ(eeprom->LoadBinary(10100), block);
+    eeprom->StoreBinary(10215, {1, 2, 3, 4});
+    EXPECT_EQ(eeprom->LoadBinary(10215), (Bytes{1, 2, 3, 4}));
+    EXPECT_EQ(eeprom->LoadBinary(10216), (Bytes{0, 1, 0x01, 0x4E})) << "the words behind are the table";
+    EXPECT_EQ(eeprom->LoadBinary(10239).size(), 4U);
+    EXPECT_THAT(eeprom->LoadBinary(10099), IsEmpty());
+    EXPECT_THAT(eeprom->LoadBinary(10240), IsEmpty());
+}
+
+TEST_F(EepromTest, BinaryDataThatDoesNotFitIsRefusedBeforeAnythingIsWritten) {
+    Load();
+    struct Case {
+        std::uint16_t id;
+        std::size_t size;
+        const char* refusal;  ///< null: accepted
+    };
+    for (const Case& row : {
+             Case{10100, 1903, "Wrong Tallimer size"},
+             Case{10100, 1905, "Wrong Tallimer size"},
+             Case{10100, 0, "Wrong Tallimer size"},
+             Case{10200, 4, nullptr},
+             Case{10200, 64, nullptr},
+             Case{10200, 65, "EEPROM access denied"},
+             Case{10215, 4, nullptr},
+             Case{10215, 5, "EEPROM access denied"},
+             Case{10215, 8192, "EEPROM access denied"},
+             Case{10216, 4, "EEPROM access denied"},
+             Case{10239, 0, "EEPROM access denied"},
+             Case{10240, 4, nullptr},
+             Case{10199, 4, nullptr},
+             Case{10099, 1904, nullptr},
+         }) {
+        SCOPED_TRACE(testing::Message() << row.id << ", " << row.size << " bytes");
+        const Bytes data(row.size, 0x55);
+        const Bytes before = instrument.eeprom;
+        if (row.refusal) {
+            EXPECT_THAT([&] { eeprom->StoreBinary(row.id, data); },
+                        ThrowsMessage<ResourceException>(StrEq(row.refusal)));
+            EXPECT_EQ(instrument.eeprom, before);
+        } else {
+            eeprom->StoreBinary(row.id, data);
+            EXPECT_EQ(Bytes(instrument.eeprom.begin() + 4096, instrument.eeprom.end()),
+                      Bytes(before.begin() + 4096, before.end()));
+        }
+    }
+}
+
+TEST_F(EepromTest, DumpOfAFreshInstrumentIsTheFreshImage) {
+    Load();
+    EXPECT_EQ(eeprom->Dump(), FreshImage());
+    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+    for (int change = 1; change <= 20; ++change) {
+        eeprom->SetProperty(10002, Long(change));
+    }
+    const Bytes image = eeprom->Dump();
+    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites)) << "which was due";
+    EXPECT_EQ(Protocol::LoadBig32(&image[2048 + 8]), 20U);
+}
+
+TEST_F(EepromTest, DumpOfValuesThatChangedTheirSizeReadsBackRight) {
+    struct Case {
+        const char* name;
+        std::uint16_t id;
+        Property value;
+    };
+    for (const Case& row : {
+             Case{"in the middle", 3009, Property(Longs{1, 2, 3})},
+             Case{"the last value", 3013, Property(Longs{7, 8})},
+             Case{"the first value", 1000, Property(std::vector<float>(40, 2.5F))},
+             Case{"shorter", 1002, Property(Longs{5})},
+             Case{"empty", 3011, Property(Longs{})},
+             Case{"as long as fits", 3013, Property(Longs(860, 9))},
+             Case{"log in the middle", 10011, Property(Longs(130, 6))},
+             Case{"log at the end", 10021, Property(Longs{3, 4})},
+             Case{"log, shorter", 10010, Property(Longs(2, 4))},
+         }) {
+        SCOPED_TRACE(row.name);
+        Load();
+        eeprom->SetProperty(row.id, row.value);
+        Bytes image = eeprom->Dump();
+        Properties calibration("CalibrationData"), log("LogData");
+        eeprom->Load(calibration);
+        eeprom->Load(log);
+        for (const bool mainLogBroken : {false, true}) {
+            image[0] = static_cast<std::uint8_t>(mainLogBroken ? ~image[0] : image[0]);
+            FakeInstrument written;
+            written.eeprom = image;
+            PellandoEEPROM again(Open(written));
+            for (const Properties* expected : {&calibration, &log}) {
+                for (const auto& [id, value] : expected->GetDatastore()) {
+                    EXPECT_EQ(again.Load(id).AsByteVector(true), value.AsByteVector(true))
+                        << id << mainLogBroken;
+                }
+            }
+        }
+        eeprom.reset();
+        instrument.eeprom = FreshImage();
+    }
+}
+
+TEST_F(EepromTest, DumpRefusesWhatCannotBeReadBack) {
+    Load();
+    eeprom->SetProperty(3013, Property(Longs(861, 9)));
+    EXPECT_THAT([&] { eeprom->Dump(); },
+                ThrowsMessage<ResourceException>(StrEq("Configuration data dump target too small")));
+    eeprom->SetProperty(3013, Long(9));
+    EXPECT_EQ(Protocol::LoadBig32(&eeprom->Dump()[4752]), 9U) << "and can when it fits again";
+
+    struct Case {
+        const char* name;
+        std::size_t entry;  ///< in the table
+        std::int32_t address;
+    };
+    for (const Case& row : {
+             Case{"calibration elsewhere", 26, 4600},
+             Case{"a gap in the calibration", 53, 4760},
+             Case{"second log elsewhere", 13, 2044},
+         }) {
+        SCOPED_TRACE(row.name);
+        eeprom.reset();
+        instrument.eeprom = FreshImage();
+        Protocol::StoreBig32(&instrument.eeprom[4096 + 4 + 6 * row.entry + 2],
+                             static_cast<std::uint32_t>(row.address));
+        Load();
+        EXPECT_THAT([&] { eeprom->Dump(); }, ThrowsMessage<DataException>(StrEq("corrupt EAT detected!!")));
+    }
+}
+
+TEST_F(EepromTest, DestructorWritesTheLogTwicePieceByPiece) {
+    Load();
+    eeprom.reset();
+    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
+    EXPECT_EQ(instrument.eeprom, FreshImage());
+}
+
+TEST_F(EepromTest, DestructorReportsALogThatIsLost) {
+    for (const bool reported : {true, false}) {
+        Load();
+        std::string reason;
+        if (reported) {
+            eeprom->ReportLostLog([&](const std::string& text) {
+                reason = text;
+                throw std::runtime_error("must not get out");
+            });
+        }
+        instrument.failingCommand = 3;
+        eeprom.reset();
+        EXPECT_EQ(reason, reported ? "the fake fails" : "");
+        EXPECT_EQ(instrument.TakeCommands().size(), 4U) << "one failure ends it";
+        instrument.failingCommand = ~std::size_t{0};
+    }
+    Load();
+    eeprom->ReportLostLog([](const std::string&) { ADD_FAILURE() << "nothing was lost"; });
+    eeprom.reset();
+}
+
+TEST_F(EepromTest, LogThatOutgrowsItsAreaNeverReachesTheTable) {
+    Load();
+    std::string reason;
+    eeprom->ReportLostLog([&](const std::string& text) { reason = text; });
+    eeprom->SetProperty(10021, Property(Longs(248, 1)));
+    EXPECT_THAT([&] { eeprom->DumpLog(); },
+                ThrowsMessage<ResourceException>(StrEq("Configuration data dump target too small")));
+    eeprom.reset();
+    EXPECT_EQ(reason, "Configuration data dump target too small");
+    EXPECT_EQ(instrument.eeprom, FreshImage());
+}
+
+}  // namespace
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

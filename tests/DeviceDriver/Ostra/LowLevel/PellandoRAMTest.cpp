@@ -1,0 +1,390 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <array>
+#include <limits>
+#include <string>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoRAM.h"
+#include "FakeCommands.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+namespace {
+
+using namespace Generic::Configuration;
+using Generic::Utilities::DataException;
+using Generic::Utilities::IOException;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using testing::StrEq;
+using testing::ThrowsMessage;
+using Varnholt::Utilities::Exceptions::ResourceException;
+using Answers = std::array<std::uint8_t, 6>;
+
+constexpr float Infinity = std::numeric_limits<float>::infinity();
+constexpr float NotANumber = std::numeric_limits<float>::quiet_NaN();
+
+Property Long(std::int32_t value) {
+    return Property(value);
+}
+
+class RamTest : public testing::Test {
+  protected:
+    RamTest() {
+        instrument.misc2 = 300;
+        instrument.describeMode = [](std::uint8_t mode) { return Answers{3, mode, 0, 130, 68, 1}; };
+        instrument.commands.clear();
+    }
+
+    /// A whole set for storing.
+    static Properties Conditions() {
+        Properties set = PellandoRAM::GetDefaultPhysicalConditons();
+        set.SetProperty(2013, Long(300));
+        set.SetProperty(2009, Property(0.068F));
+        set.SetProperty(2001, Property(0.0884F));
+        set.SetProperty(2010, Long(100));
+        for (const std::uint16_t id : std::vector<std::uint16_t>{2008, 2000, 2002, 2003}) {
+            set.SetProperty(id, Long(0));
+        }
+        return set;
+    }
+    std::vector<std::string> CommandNames() {
+        std::vector<std::string> names;
+        for (const Command& command : instrument.TakeCommands()) {
+            names.push_back(command.name);
+        }
+        return names;
+    }
+
+    FakeInstrument instrument;
+    PellandoRAM ram{Open(instrument)};
+};
+
+TEST_F(RamTest, LoadsMiscValuesAndWhatFollowsFromTheSecond) {
+    instrument.misc1 = 200;
+    instrument.misc3 = 3;
+    instrument.misc4 = 65535;
+    instrument.misc5 = 5;
+    for (const int misc2 : {0, 300, 301, 65535}) {
+        instrument.misc2 = static_cast<std::uint16_t>(misc2);
+        Properties set;
+        set.SetProperty(2013, Property());
+        EXPECT_EQ(&ram.Load(set), &set);
+        EXPECT_THAT(CommandNames(), ElementsAre("GetMISC"));
+        EXPECT_THAT(set.GetPropertyKeys(), ElementsAre(2013, 2012, 2004, 2006, 2020, 2016, 2017));
+        EXPECT_EQ(set.GetProperty(2012).AsLong(), 200);
+        EXPECT_EQ(set.GetProperty(2013).AsLong(), misc2);
+        EXPECT_EQ(set.GetProperty(2004).AsLong(), 3);
+        EXPECT_EQ(set.GetProperty(2006).AsLong(), 65535);
+        EXPECT_EQ(set.GetProperty(2020).AsLong(), 5);
+        EXPECT_EQ(set.GetProperty(2016).AsFloat(), misc2 < 301 ? 0.5F : 0.25F);
+        EXPECT_EQ(set.GetProperty(2017).AsFloat(), misc2 < 301 ? 0.012F : 0.005F);
+    }
+}
+
+TEST_F(RamTest, LoadsMeasurementParametersInSecondsAndFlags) {
+    instrument.p1 = 1000;
+    instrument.p2 = 10;
+    instrument.p3 = 65535;
+    instrument.p5 = 7;
+    for (int flags = 0; flags < 16; ++flags) {
+        instrument.p4 = static_cast<std::uint8_t>(flags | 0xA0);
+        Properties set;
+        set.SetProperty(2021, Property());
+        ram.Load(set);
+        EXPECT_THAT(CommandNames(), ElementsAre("GetMeasureParameters"));
+        EXPECT_THAT(set.GetPropertyKeys(), ElementsAre(2021, 2009, 2001, 2010, 2008, 2000, 2002, 2003));
+        EXPECT_FLOAT_EQ(set.GetProperty(2009).AsFloat(), 0.068F);
+        EXPECT_FLOAT_EQ(set.GetProperty(2001).AsFloat(), 0.0884F);
+        EXPECT_EQ(set.GetProperty(2010).AsLong(), 65535);
+        EXPECT_EQ(set.GetProperty(2021).AsLong(), 7);
+        EXPECT_EQ(set.GetProperty(2008).AsLong(), flags & 1);
+        EXPECT_EQ(set.GetProperty(2000).AsLong(), flags >> 1 & 1);
+        EXPECT_EQ(set.GetProperty(2002).AsLong(), flags >> 2 & 1);
+        EXPECT_EQ(set.GetProperty(2003).AsLong(), flags >> 3 & 1);
+    }
+    instrument.p2 = 65535;
+    EXPECT_FLOAT_EQ(ram.Load(2001).AsFloat(), 579.3294F);
+}
+
+TEST_F(RamTest, LoadAsksOnlyForWhatIsWanted) {
+    Properties set;
+    set.SetProperty(1000, Long(3));
+    set.SetProperty(2005, Long(4));
+    ram.Load(set);
+    EXPECT_EQ(set.GetItemCount(), 2U);
+    EXPECT_EQ(ram.Load(2007).AsLong(), 0);
+    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+
+    Properties conditions("PhysicalConditions");
+    ram.Load(conditions);
+    EXPECT_THAT(CommandNames(), ElementsAre("GetMISC", "GetMeasureParameters"));
+    EXPECT_EQ(conditions.GetItemCount(), 20U) << "the 19 and 2021";
+    for (const std::uint16_t id : std::vector<std::uint16_t>{2005, 2011, 2014, 2015, 9189}) {
+        EXPECT_EQ(conditions.GetProperty(id).AsLong(), -1) << id;
+    }
+    EXPECT_EQ(conditions.GetProperty(2013).AsLong(), 300);
+    EXPECT_FALSE(conditions.Contains(2007));
+    EXPECT_THAT([&] { ram.Load(9189); }, ThrowsMessage<DataException>(StrEq("invalid property id 9189")));
+}
+
+TEST_F(RamTest, TemplateHoldsItsIdentifiersInOrder) {
+    const Properties& conditions = PellandoRAM::GetDefaultPhysicalConditons();
+    EXPECT_EQ(conditions.GetName(), "PhysicalConditions");
+    EXPECT_THAT(conditions.GetPropertyKeys(),
+                ElementsAre(2000, 2001, 2002, 2003, 2008, 2009, 2010, 2004, 2005, 2006, 2012, 2013, 2020,
+                            2011, 2014, 2015, 2016, 2017, 9189));
+    for (const auto& [id, value] : conditions.GetDatastore()) {
+        if (id == 2001 || id == 2009 || id == 2016 || id == 2017) {
+            EXPECT_EQ(value.AsFloat(), -1.0F) << id;
+        } else {
+            EXPECT_EQ(value.AsLong(), -1) << id;
+        }
+    }
+}
+
+TEST_F(RamTest, StoresTimesAsRoundedCounts) {
+    struct Case {
+        const char* name;
+        float integrationTime;
+        std::uint16_t p1;
+        float secondTime;
+        std::uint16_t p2;
+    };
+    for (const Case& row : {
+             Case{"whole counts", 0.068F, 1000, 0.0884F, 10},
+             Case{"rounded up", 0.06804F, 1001, 0.0933F, 11},
+             Case{"rounded down", 0.06803F, 1000, 0.0927F, 10},
+             Case{"nothing", 0, 0, 0, 0},
+             Case{"half a count", 3.5e-5F, 1, 0.00443F, 1},
+             Case{"longest", 4.45638F, 65535, 579.3294F, 65535},
+             Case{"16 low bits", 4.456448F, 0, 579.33824F, 0},
+             Case{"the template's -1", -1.0F, 50831, -1.0F, 65424},
+             Case{"more than 32 bits", 1e9F, 0xFFFF, 1e9F, 0xFFFF},
+             Case{"less than 32 bits", -1e9F, 0, -1e9F, 0},
+             Case{"endless", Infinity, 0xFFFF, Infinity, 0xFFFF},
+             Case{"endless, backwards", -Infinity, 0, -Infinity, 0},
+             Case{"no number", NotANumber, 0, NotANumber, 0},
+         }) {
+        Properties set = Conditions();
+        set.SetProperty(2009, Property(row.integrationTime));
+        set.SetProperty(2001, Property(row.secondTime));
+        ram.Store(set);
+        EXPECT_THAT(CommandNames(), ElementsAre("SetMeasureParameters"));
+        EXPECT_EQ(instrument.p1, row.p1) << row.name;
+        EXPECT_EQ(instrument.p2, row.p2) << row.name;
+    }
+}
+
+TEST_F(RamTest, StoresThirdParameterAndFlags) {
+    struct Case {
+        std::int32_t third;
+        std::int32_t replacement;  ///< 0: not in the set
+        std::int32_t flag0;
+        std::uint16_t p3;
+        std::uint8_t flags;
+    };
+    for (const Case& row : {
+             Case{255, -1, 0, 255, 0},
+             Case{256, -1, 0, 256, 0},
+             Case{300, -1, 0, 256, 0},
+             Case{-1, -1, 0, 65535, 0},
+             Case{100, -1, 1, 100, 1},
+             Case{100, 0, 1, 100, 1},
+             Case{100, 300, 1, 300, 0},
+             Case{100, 300, -7, 300, 0},
+             Case{100, 65537, 1, 1, 0},
+             Case{100, 300, 0, 100, 0},
+         }) {
+        SCOPED_TRACE(testing::Message() << row.third << " " << row.replacement << " " << row.flag0);
+        Properties set = Conditions();
+        set.SetProperty(2010, Long(row.third));
+        set.SetProperty(2008, Long(row.flag0));
+        if (row.replacement == 0) {
+            set.GetDatastore().remove_if([](const auto& entry) { return entry.first == 9189; });
+        } else {
+            set.SetProperty(9189, Long(row.replacement));
+        }
+        ram.Store(set);
+        EXPECT_EQ(instrument.p3, row.p3);
+        EXPECT_EQ(instrument.p4, row.flags);
+    }
+    const std::pair<std::uint16_t, std::uint8_t> flags[] = {{2008, 1}, {2000, 2}, {2002, 4}, {2003, 8}};
+    for (const auto& [id, bit] : flags) {
+        Properties set = Conditions();
+        set.SetProperty(id, Long(2));
+        ram.Store(set);
+        EXPECT_EQ(instrument.p4, bit) << id;
+    }
+}
+
+TEST_F(RamTest, StoreNeedsAWholeSet) {
+    for (const std::uint16_t id :
+         std::vector<std::uint16_t>{2013, 2009, 2001, 2010, 2008, 2000, 2002, 2003}) {
+        Properties set = Conditions();
+        set.GetDatastore().remove_if([id](const auto& entry) { return entry.first == id; });
+        EXPECT_THAT([&] { ram.Store(set); },
+                    ThrowsMessage<ResourceException>(StrEq("id " + std::to_string(id) + " doesn't exist")));
+    }
+    EXPECT_THAT([&] { ram.Store(2009, Property(0.1F)); },
+                ThrowsMessage<ResourceException>(StrEq("id 2013 doesn't exist")));
+    ram.Store(2013, Long(1));
+    ram.Store(1211, Long(1));
+    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+}
+
+/// Three modes, the later ones with the finer time base.
+Answers ThreeModes(std::uint8_t mode) {
+    switch (mode) {
+        case 1:
+            return {3, 1, 0, 130, 68, 1};
+        case 2:
+            return {3, 2, 0, 100, 20, 0};
+        default:
+            return {3, 3, 0, 10, 5, 1};
+    }
+}
+
+class ModeSearch : public RamTest {
+  protected:
+    ModeSearch() {
+        instrument.misc2 = 301;
+        instrument.describeMode = &ThreeModes;
+        set.SetProperty(2013, Long(301));
+    }
+    void Want(double microseconds) {
+        set.SetProperty(2009, Property(static_cast<float>(microseconds / 1e6)));
+    }
+    std::vector<std::uint32_t> TriedModes() {
+        std::vector<std::uint32_t> modes;
+        for (const Command& command : instrument.TakeCommands()) {
+            if (command.name == "SetMeasureMode") {
+                modes.push_back(command.address);
+            }
+        }
+        return modes;
+    }
+
+    Properties set = Conditions();
+};
+
+TEST_F(ModeSearch, TakesTheFirstModeThatFits) {
+    struct Case {
+        const char* name;
+        double microseconds;
+        std::vector<std::uint32_t> tried;
+        bool perfect;
+        std::uint16_t p1;
+    };
+    for (const Case& row : {
+             Case{"first mode", 68000, {1}, true, 1000},
+             Case{"shortest of the first", 8840.5, {1}, true, 130},
+             Case{"too short for the first", 8839.5, {1, 2}, false, 442},
+             Case{"shortest of the second", 2000.5, {1, 2}, false, 100},
+             Case{"last mode", 1999.5, {1, 2, 3}, true, 400},
+             Case{"shortest of all", 50.2, {1, 2, 3}, true, 10},
+             Case{"longest of all", 4456378, {1}, true, 65535},
+         }) {
+        SCOPED_TRACE(row.name);
+        Want(row.microseconds);
+        ram.Store(set);
+        EXPECT_EQ(TriedModes(), row.tried);
+        EXPECT_EQ(ram.IsInPerfectMode(), row.perfect);
+        EXPECT_EQ(instrument.p1, row.p1);
+        EXPECT_NEAR(ram.Load(2009).AsFloat(), row.microseconds / 1e6, 40e-6)
+            << "loads with the same time base";
+        instrument.TakeCommands();
+    }
+}
+
+TEST_F(ModeSearch, UsesTheModesFactorForTheSecondTime) {
+    Want(3000);
+    set.SetProperty(2001, Property(0.008F));
+    ram.Store(set);
+    EXPECT_EQ(instrument.p2, 4U) << "0.008 s in units of 100 times 20 us";
+    EXPECT_FLOAT_EQ(ram.Load(2001).AsFloat(), 0.008F);
+    set.SetProperty(2013, Long(300));
+    ram.Store(set);
+    EXPECT_EQ(instrument.p2, 1U) << "an instrument without modes has the time base of construction";
+    EXPECT_FALSE(ram.IsInPerfectMode());
+}
+
+TEST_F(ModeSearch, RefusesTimesThatNoModeCanCount) {
+    struct Case {
+        const char* name;
+        float seconds;
+        const char* message;
+        std::size_t rounds;
+    };
+    constexpr const char* high = "Integration time too high";
+    constexpr const char* low = "Integration time too low";
+    for (const Case& row : {
+             Case{"first count that is too much", 4.4563805F, high, 1},
+             Case{"the template's -1", -1.0F, high, 1},
+             Case{"too short for the last", 49e-6F, low, 3},
+             Case{"nothing", 0, low, 3},
+             Case{"endless", Infinity, high, 1},
+             Case{"no number", NotANumber, low, 3},
+         }) {
+        SCOPED_TRACE(row.name);
+        Want(68000);
+        ram.Store(set);
+        ASSERT_TRUE(ram.IsInPerfectMode());
+        instrument.TakeCommands();
+        set.SetProperty(2009, Property(row.seconds));
+        EXPECT_THAT([&] { ram.Store(set); }, ThrowsMessage<ResourceException>(StrEq(row.message)));
+        EXPECT_EQ(ram.IsInPerfectMode(), row.message == high) << "too high leaves it, too low clears it";
+        const auto names = CommandNames();
+        EXPECT_EQ(names.size(), 2 * row.rounds);
+        EXPECT_THAT(names, testing::Not(testing::Contains("SetMeasureParameters")));
+        instrument.p1 = 1000;
+        EXPECT_FLOAT_EQ(ram.Load(2009).AsFloat(), 0.068F) << "the time base of construction";
+        instrument.TakeCommands();
+    }
+}
+
+TEST_F(ModeSearch, EndsWithEveryInstrument) {
+    struct Case {
+        const char* name;
+        Answers (*describe)(std::uint8_t mode);
+        std::size_t rounds;
+    };
+    for (const Case& row : {
+             Case{"never leaves its first mode", [](std::uint8_t) { return Answers{3, 0, 0, 255, 255, 1}; },
+                  255},
+             Case{"goes back and forth",
+                  [](std::uint8_t mode) {
+                      return Answers{255, static_cast<std::uint8_t>(mode ^ 1U), 0, 255, 255, 1};
+                  },
+                  255},
+             Case{"255 modes", [](std::uint8_t mode) { return Answers{255, mode, 0, 255, 255, 1}; }, 255},
+             Case{"jumps to the last", [](std::uint8_t) { return Answers{9, 9, 0, 255, 255, 1}; }, 1},
+             Case{"no modes", [](std::uint8_t mode) { return Answers{0, mode, 0, 255, 255, 1}; }, 1},
+         }) {
+        Want(1000);
+        instrument.describeMode = row.describe;
+        EXPECT_THAT([&] { ram.Store(set); },
+                    ThrowsMessage<ResourceException>(StrEq("Integration time too low")))
+            << row.name;
+        EXPECT_EQ(TriedModes().size(), row.rounds) << row.name;
+    }
+    instrument.describeMode = [](std::uint8_t mode) { return Answers{3, mode, 0, 130, 0, 1}; };
+    EXPECT_THAT([&] { ram.Store(set); }, ThrowsMessage<ResourceException>(StrEq("Integration time too high")))
+        << "a time base of nothing";
+    instrument.describeMode = [](std::uint8_t mode) { return Answers{3, mode, 0, 0, 68, 1}; };
+    ram.Store(set);
+    EXPECT_EQ(instrument.p2, 0xFFFF) << "a factor of nothing";
+}
+
+TEST_F(ModeSearch, FailureOfACommandPassesThrough) {
+    Want(1999.5);
+    for (std::size_t command = 0; command < 7; ++command) {
+        instrument.failingCommand = command;
+        EXPECT_THAT([&] { ram.Store(set); }, ThrowsMessage<IOException>(StrEq("the fake fails")));
+        EXPECT_EQ(instrument.TakeCommands().size(), command + 1);
+    }
+}
+
+}  // namespace
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel
