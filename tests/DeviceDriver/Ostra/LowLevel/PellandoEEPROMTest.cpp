@@ -311,18 +311,20 @@ TEST_F(EepromTest, DumpRefusesWhatCannotBeReadBack) {
     struct Case {
         const char* name;
         std::size_t entry;  ///< in the table
-        std::int32_t address;
+        std::uint16_t id;
+        std::uint32_t address;
     };
     for (const Case& row : {
-             Case{"calibration elsewhere", 26, 4600},
-             Case{"a gap in the calibration", 53, 4760},
-             Case{"second log elsewhere", 13, 2044},
+             Case{"calibration elsewhere", 26, 1000, 4600},
+             Case{"a gap in the calibration", 29, 1206, 4632},
+             Case{"second log elsewhere", 13, 11000, 2044},
          }) {
         SCOPED_TRACE(row.name);
         eeprom.reset();
         instrument.eeprom = FreshImage();
-        Protocol::StoreBig32(&instrument.eeprom[4096 + 4 + 6 * row.entry + 2],
-                             static_cast<std::uint32_t>(row.address));
+        std::uint8_t* const entry = &instrument.eeprom[4096 + 4 + 6 * row.entry];
+        Protocol::StoreBig16(entry, row.id);
+        Protocol::StoreBig32(entry + 2, row.address);
         Load();
         EXPECT_THAT([&] { eeprom->Dump(); }, ThrowsMessage<DataException>(StrEq("corrupt EAT detected!!")));
     }
