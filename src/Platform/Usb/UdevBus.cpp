@@ -12,6 +12,7 @@
 #include <string_view>
 
 #include "Platform/Usb/LibUsbDevice.h"
+#include "Platform/Usb/UsbDescriptors.h"
 #include "Protocol/Instrument.h"
 
 namespace Varnholt::Platform::Usb {
@@ -97,28 +98,15 @@ std::vector<UsbDeviceInfo> ListDevices(bool registeredOnly) {
     return devices;
 }
 
-/// The endpoint addresses of the first interface, read from the descriptors that the kernel keeps.
-std::set<std::uint8_t> EndpointsOfFirstInterface(const std::string& systemPath) {
+/// From the descriptors that the kernel keeps.
+std::set<std::uint8_t> EndpointAddresses(const std::string& systemPath) {
     std::ifstream file(systemPath + "/descriptors", std::ios::binary);
     const std::vector<std::uint8_t> bytes{std::istreambuf_iterator<char>(file), {}};
-    constexpr std::uint8_t interfaceDescriptor = 4;
-    constexpr std::uint8_t endpointDescriptor = 5;
-    std::set<std::uint8_t> endpoints;
-    bool inFirstInterface = false;
-    for (std::size_t place = 0; place + 2 <= bytes.size() && bytes[place] >= 2;) {
-        const std::size_t length = bytes[place];
-        const std::uint8_t type = bytes[place + 1];
-        if (place + length > bytes.size()) {
-            break;
-        }
-        if (type == interfaceDescriptor && length >= 4) {
-            inFirstInterface = bytes[place + 2] == 0 && bytes[place + 3] == 0;
-        } else if (type == endpointDescriptor && length >= 3 && inFirstInterface) {
-            endpoints.insert(bytes[place + 2]);
-        }
-        place += length;
+    std::set<std::uint8_t> addresses;
+    for (const EndpointInfo& endpoint : EndpointsOfFirstInterface(bytes)) {
+        addresses.insert(endpoint.address);
     }
-    return endpoints;
+    return addresses;
 }
 
 class UdevBus final : public UsbBus {
@@ -151,7 +139,7 @@ std::vector<UsbDeviceInfo> ListRegisteredDevices() {
 std::vector<UsbDeviceInfo> ListCandidateDevices() {
     std::vector<UsbDeviceInfo> devices = ListDevices(false);
     std::erase_if(devices, [](const UsbDeviceInfo& device) {
-        const auto endpoints = EndpointsOfFirstInterface(device.systemPath);
+        const auto endpoints = EndpointAddresses(device.systemPath);
         return !endpoints.contains(Protocol::BulkOutEndpoint) ||
                !endpoints.contains(Protocol::BulkInEndpoint) ||
                !endpoints.contains(Protocol::InterruptInEndpoint);

@@ -1,0 +1,44 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "PollLoop.h"
+#include "SimulatedInstrument.h"
+#include "TransferLog.h"
+
+namespace Varnholt::Simulator {
+
+/// An EEPROM image from a file. Throws `std::runtime_error` with a text for people when it cannot be read or
+/// has not exactly 8192 bytes.
+std::vector<std::uint8_t> ReadEepromFile(const std::string& fileName);
+
+/// Keeps an instrument's EEPROM in a file: written a moment after the memory changed, and at the end. The
+/// file is replaced only when the new one is complete. Lives on the loop's thread.
+class EepromFile final {
+  public:
+    /// `pollLoop` must outlive it. `logger` is told when the file cannot be written.
+    EepromFile(PollLoop& pollLoop, std::string name, Log logger);
+    ~EepromFile();
+    EepromFile(const EepromFile&) = delete;
+    EepromFile& operator=(const EepromFile&) = delete;
+
+    bool Exists() const;
+    /// The instrument whose memory it is, from the moment on that it exists.
+    void Keep(std::shared_ptr<SimulatedInstrument> kept);
+    /// To be told by the instrument.
+    void MemoryChanged();
+
+  private:
+    void Save();
+
+    PollLoop& loop;
+    const std::string fileName;
+    const Log log;
+    std::shared_ptr<SimulatedInstrument> instrument;
+    Platform::EventScheduler::EventId saving = 0;
+};
+
+}  // namespace Varnholt::Simulator

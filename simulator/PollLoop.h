@@ -1,0 +1,47 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <utility>
+
+#include "Platform/EventScheduler.h"
+
+namespace Varnholt::Simulator {
+
+/// Waits for files and for points in time, and calls whoever asked for them, on the thread of `Run`. To be
+/// used from that thread only.
+class PollLoop final : public Platform::EventScheduler {
+  public:
+    std::uint64_t Now() override;
+    EventId CallAt(std::uint64_t time, std::function<void()> event) override;
+    void Forget(EventId id) override;
+    /// As soon as what is being called now has returned.
+    EventId CallSoon(std::function<void()> event) { return CallAt(0, std::move(event)); }
+
+    /// Calls `handler` whenever the file is ready for one of `events` (as for poll), or broken. Replaces an
+    /// earlier watch of the file.
+    void Watch(int file, short events, std::function<void()> handler);
+    void Unwatch(int file) { watches.erase(file); }
+
+    /// Until `Stop`.
+    void Run();
+    void Stop() { stopped = true; }
+
+  private:
+    struct WatchedFile {
+        short events;
+        std::shared_ptr<const std::function<void()>> handler;
+    };
+
+    void CallDueEvents();
+    int MillisecondsToNextEvent();
+
+    std::map<int, WatchedFile> watches;
+    std::map<std::pair<std::uint64_t, EventId>, std::function<void()>> waiting;
+    EventId lastId = 0;
+    bool stopped = false;
+};
+
+}  // namespace Varnholt::Simulator

@@ -1,0 +1,64 @@
+#include "TransferLog.h"
+
+#include <utility>
+
+#include "Platform/Usb/InterceptingDevice.h"
+#include "Protocol/DescribeTransfer.h"
+#include "Protocol/Instrument.h"
+#include "TransferRecorder.h"
+
+namespace Varnholt::Simulator {
+
+using Platform::Usb::Transfer;
+using Platform::Usb::TransferStatus;
+using Platform::Usb::UsbDevice;
+
+namespace {
+
+std::string Describe(const Transfer& transfer) {
+    constexpr std::uint8_t typeMask = 0x60;
+    constexpr std::uint8_t vendorType = 0x40;
+    if (transfer.endpoint != 0) {
+        const std::string name = transfer.endpoint == Protocol::InterruptInEndpoint ? "interrupt"
+                                 : transfer.IsIn()                                  ? "bulk in"
+                                                                                    : "bulk out";
+        return name + " " + std::to_string(transfer.actualLength) + " of " + std::to_string(transfer.length);
+    }
+    if ((transfer.setup.requestType & typeMask) == vendorType) {
+        return Protocol::DescribeRequest(
+            transfer.setup.request, transfer.setup.value,
+            {transfer.data, transfer.IsIn() ? transfer.actualLength : transfer.length});
+    }
+    return "standard request " + std::to_string(transfer.setup.request) + " value " +
+           std::to_string(transfer.setup.value) + " index " + std::to_string(transfer.setup.index);
+}
+
+class LoggedDevice final : public Platform::Usb::InterceptingDevice {
+  public:
+    LoggedDevice(std::shared_ptr<UsbDevice> behind, Log tell)
+        : InterceptingDevice(std::move(behind)), log(std::move(tell)) {}
+    ~LoggedDevice() override { Detach(); }
+
+  private:
+    void BeforeSubmit(std::uint64_t, Transfer&) override {}
+    void AfterCompletion(std::uint64_t, Transfer& transfer) noexcept override {
+        std::string line = Describe(transfer);
+        if (transfer.status != TransferStatus::Completed) {
+            line += ": " + ToText(transfer.status);
+        }
+        log(line);
+    }
+    void Refused(std::uint64_t, Transfer& transfer, Platform::ErrorCode code) override {
+        log(Describe(transfer) + ": refused with code " + std::to_string(code));
+    }
+
+    const Log log;
+};
+
+}  // namespace
+
+std::shared_ptr<UsbDevice> LogTransfers(std::shared_ptr<UsbDevice> device, Log log) {
+    return std::make_shared<LoggedDevice>(std::move(device), std::move(log));
+}
+
+}  // namespace Varnholt::Simulator

@@ -1,0 +1,407 @@
+#include "UsbIpServer.h"
+
+#include <arpa/inet.h>
+#include <fcntl.h>
+#include <netinet/in.h>
+#include <netinet/tcp.h>
+#include <poll.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <fstream>
+#include <stdexcept>
+#include <utility>
+
+#include "Descriptors.h"
+#include "FaultInjector.h"
+#include "Platform/Usb/SimulatorAddress.h"
+#include "Platform/Usb/SimulatorBus.h"
+
+namespace Varnholt::Simulator {
+
+namespace UsbIp = Platform::Usb::UsbIp;
+namespace Errors = Platform::Errors;
+using Platform::Usb::UsbDevice;
+
+namespace {
+
+[[noreturn]] void Fail(const std::string& what) {
+    throw std::runtime_error(what + ": " + std::strerror(errno));
+}
+
+std::string DescribeProcess(int processId) {
+    std::ifstream file("/proc/" + std::to_string(processId) + "/comm");
+    std::string command;
+    std::getline(file, command);
+    return "process " + std::to_string(processId) + (command.empty() ? "" : " (" + command + ")");
+}
+
+}  // namespace
+
+/// An instrument and who has it.
+struct UsbIpServer::Exported : Export {
+    std::uint32_t number = 0;  // from 1: device number, and port in TCP bus ids
+    std::string usedBy;
+
+    UsbIp::DeviceRecord Record(const std::string& busId) const {
+        UsbIp::DeviceRecord record;
+        record.path = "/simulated/" + name + (usedBy.empty() ? "" : Platform::Usb::UsedByMark + usedBy);
+        record.busId = busId;
+        record.busNumber = 1;
+        record.deviceNumber = number;
+        record.vendorId = VendorId;
+        record.productId = ProductId;
+        record.version = DeviceVersion;
+        record.classes = {VendorClass, 0, 0};
+        record.configurationValue = ConfigurationValue;
+        record.configurations = 1;
+        record.interfaces = 1;
+        return record;
+    }
+    std::string BusId() const { return "1-" + std::to_string(number); }
+};
+
+/// What one connection can import: the instruments of the socket that it came by.
+class UsbIpServer::Exports final : public UsbIpExports {
+  public:
+    Exports(UsbIpServer& ownServer, std::vector<Exported*> offeredInstruments, std::string peer,
+            bool ownBusIds)
+        : server(ownServer),
+          offered(std::move(offeredInstruments)),
+          peerText(std::move(peer)),
+          tcp(ownBusIds) {}
+    ~Exports() override {
+        if (imported) {
+            server.Tell(imported->name + ": released by " + peerText);
+            imported->usedBy.clear();
+        }
+    }
+
+    std::vector<UsbIp::DeviceRecord> List() override {
+        std::vector<UsbIp::DeviceRecord> records;
+        for (const Exported* const each : offered) {
+            records.push_back(each->Record(BusIdOf(*each)));
+        }
+        return records;
+    }
+
+    Import ImportDevice(const std::string& busId) override {
+        const auto found =
+            std::ranges::find_if(offered, [&](const Exported* each) { return BusIdOf(*each) == busId; });
+        if (found == offered.end()) {
+            return {UsbIp::OperationStatus::NoDevice, {}, nullptr};
+        }
+        return Take(**found);
+    }
+
+    Import Take(Exported& wanted) {
+        std::shared_ptr<UsbDevice> device = SimulatedInstrument::Connect(wanted.instrument);
+        if (const auto code = device->Claim(); code != Errors::Success) {
+            return {code == Errors::Busy ? UsbIp::OperationStatus::Busy : UsbIp::OperationStatus::NoDevice,
+                    {},
+                    nullptr};
+        }
+        if (!wanted.faults.Faults().empty()) {
+            // A fault's unplugging ends the connection; the instrument is back at once.
+            const auto replug = [instrument = wanted.instrument] {
+                instrument->Unplug();
+                instrument->PlugIn();
+            };
+            device = InjectFaults(std::move(device), std::make_shared<FaultScript>(wanted.faults),
+                                  server.loop, replug);
+        }
+        if (wanted.wrap) {
+            device = wanted.wrap(std::move(device));
+        }
+        if (server.log) {
+            device =
+                LogTransfers(std::move(device), [tell = server.log, name = wanted.name](
+                                                    const std::string& line) { tell(name + ": " + line); });
+        }
+        imported = &wanted;
+        wanted.usedBy = peerText;
+        server.Tell(wanted.name + ": opened by " + peerText);
+        return {UsbIp::OperationStatus::Ok, wanted.Record(BusIdOf(wanted)), std::move(device)};
+    }
+
+  private:
+    std::string BusIdOf(const Exported& each) const {
+        return tcp ? each.BusId() : Platform::Usb::SimulatorBusId;
+    }
+
+    UsbIpServer& server;
+    const std::vector<Exported*> offered;
+    const std::string peerText;
+    const bool tcp;
+    Exported* imported = nullptr;
+};
+
+/// A connected socket with its session. Never waits for its peer.
+class UsbIpServer::Connection final {
+  public:
+    Connection(UsbIpServer& ownServer, int connectedSocket, std::unique_ptr<Exports> offeredInstruments,
+               std::string peer)
+        : server(ownServer),
+          file(connectedSocket),
+          peerText(std::move(peer)),
+          exports(std::move(offeredInstruments)) {}
+    ~Connection() {
+        Abandon();
+        session.reset();  // before the instrument counts as free again
+        exports.reset();
+        close(file);
+    }
+    Connection(const Connection&) = delete;
+    Connection& operator=(const Connection&) = delete;
+
+    void Begin() {
+        session = std::make_unique<UsbIpSession>(*exports, [this] { FlushSoon(); });
+        Watch();
+    }
+    /// No more is heard of it; it may be one of its own functions that is running.
+    void Abandon() {
+        abandoned = true;
+        server.loop.Forget(flush);
+        server.loop.Unwatch(file);
+    }
+
+    void BeginImported(std::shared_ptr<UsbDevice> device) {
+        session = std::make_unique<UsbIpSession>(std::move(device), [this] { FlushSoon(); });
+        Watch();
+    }
+
+  private:
+    void Watch() {
+        short events = 0;
+        if (session->WantsInput()) {
+            events = static_cast<short>(events | POLLIN);
+        }
+        if (!session->Output().empty()) {
+            events = static_cast<short>(events | POLLOUT);
+        }
+        if (events != watchedFor) {
+            watchedFor = events;
+            server.loop.Watch(file, events, [this] { Ready(); });
+        }
+    }
+
+    /// Not from inside the session, which is busy.
+    void FlushSoon() {
+        if (flush == 0 && !abandoned) {
+            flush = server.loop.CallSoon([this] {
+                flush = 0;
+                Flush();
+            });
+        }
+    }
+
+    void Ready() {
+        bool lost = false;
+        // The buffer's size bounds how long one peer keeps the others waiting.
+        std::array<std::uint8_t, 65536> buffer;  // NOLINT: filled before it is read
+        if (session->WantsInput()) {
+            const ssize_t count = recv(file, buffer.data(), buffer.size(), MSG_DONTWAIT);
+            lost = count == 0 || (count < 0 && errno != EAGAIN && errno != EINTR);
+            if (count > 0) {
+                session->Receive({buffer.data(), static_cast<std::size_t>(count)});
+            }
+        }
+        lost ? server.Remove(*this) : Flush();
+    }
+
+    void Flush() {
+        while (!session->Output().empty()) {
+            const auto output = session->Output();
+            const ssize_t count = send(file, output.data(), output.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
+            if (count < 0 && errno == EAGAIN) {
+                break;
+            }
+            if (count < 0 && errno != EINTR) {
+                server.Remove(*this);
+                return;
+            }
+            session->OutputSent(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+        }
+        if (session->Over() && session->Output().empty()) {
+            if (!session->Complaint().empty()) {
+                server.Tell(peerText + ": " + session->Complaint());
+            }
+            server.Remove(*this);
+            return;
+        }
+        Watch();
+    }
+
+    UsbIpServer& server;
+    const int file;
+    const std::string peerText;
+    std::unique_ptr<Exports> exports;
+    std::unique_ptr<UsbIpSession> session;
+    Platform::EventScheduler::EventId flush = 0;
+    short watchedFor = -1;
+    bool abandoned = false;
+};
+
+UsbIpServer::UsbIpServer(PollLoop& pollLoop, Log logger) : loop(pollLoop), log(std::move(logger)) {}
+
+UsbIpServer::~UsbIpServer() {
+    loop.Forget(cleaning);
+    loop.Forget(relistening);
+    removed.clear();
+    connections.clear();
+    for (const Listener& listener : listeners) {
+        loop.Unwatch(listener.file);
+        close(listener.file);
+    }
+}
+
+void UsbIpServer::Tell(const std::string& line) const {
+    if (log) {
+        log(line);
+    }
+}
+
+void UsbIpServer::Add(Export added) {
+    if (!Platform::Usb::IsSimulatorName(added.name)) {
+        throw std::runtime_error("\"" + added.name +
+                                 "\" is no name: letters, digits, '-', '_' and '.', at most 64 of them");
+    }
+    const int file = Platform::Usb::ListenAsSimulator(added.name);
+    if (file < 0 && errno == EADDRINUSE) {
+        throw std::runtime_error("an instrument named \"" + added.name +
+                                 "\" is already simulated; choose another --name");
+    }
+    if (file < 0) {
+        Fail("cannot listen for \"" + added.name + "\"");
+    }
+    Exported& exported = exportedInstruments.emplace_back();
+    static_cast<Export&>(exported) = std::move(added);
+    exported.number = static_cast<std::uint32_t>(exportedInstruments.size());
+    ListenTo(file, {&exported}, true);
+}
+
+std::uint16_t UsbIpServer::ListenTcp(std::uint16_t port) {
+    const int file = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    if (file < 0) {
+        Fail("no TCP socket");
+    }
+    const int on = 1;
+    setsockopt(file, SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_port = htons(port);
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    socklen_t size = sizeof address;
+    auto* const generic = reinterpret_cast<sockaddr*>(&address);
+    constexpr int waitingConnections = 16;
+    if (bind(file, generic, size) != 0 || listen(file, waitingConnections) != 0 ||
+        getsockname(file, generic, &size) != 0) {
+        const int error = errno;
+        close(file);
+        errno = error;
+        Fail("cannot listen on TCP port " + std::to_string(port));
+    }
+    std::vector<Exported*> all;
+    for (Exported& each : exportedInstruments) {
+        all.push_back(&each);
+    }
+    ListenTo(file, std::move(all), false);
+    return ntohs(address.sin_port);
+}
+
+std::string UsbIpServer::TcpBusId(const std::string& name) const {
+    const auto found = std::ranges::find(exportedInstruments, name, &Exported::name);
+    return found == exportedInstruments.end() ? std::string() : found->BusId();
+}
+
+void UsbIpServer::ListenTo(int file, std::vector<Exported*> offered, bool unixSocket) {
+    fcntl(file, F_SETFL, O_NONBLOCK);
+    listeners.push_back({file, unixSocket, std::move(offered)});
+    Listen();
+}
+
+void UsbIpServer::Listen() {
+    for (const Listener& listener : listeners) {
+        loop.Watch(listener.file, POLLIN, [this, &listener] { Accept(listener); });
+    }
+}
+
+void UsbIpServer::PauseListening() {
+    constexpr std::uint64_t pause = 100'000;
+    for (const Listener& listener : listeners) {
+        loop.Unwatch(listener.file);
+    }
+    loop.Forget(relistening);
+    relistening = loop.CallAt(loop.Now() + pause, [this] { Listen(); });
+}
+
+void UsbIpServer::Accept(const Listener& listener) {
+    constexpr std::size_t mostConnections = 256;
+    const int file = accept4(listener.file, nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK);
+    if (file < 0) {
+        if (errno != EAGAIN && errno != EINTR && errno != ECONNABORTED) {
+            PauseListening();  // no file is left: one may be later
+        }
+        return;
+    }
+    std::string peer = "a TCP peer";
+    if (listener.unixSocket) {
+        const auto credentials = Platform::Usb::CredentialsOfPeer(file);
+        if (!credentials || !Platform::Usb::IsTrustedUser(credentials->userId)) {
+            Tell("refused a process of another user");
+            close(file);
+            return;
+        }
+        peer = DescribeProcess(credentials->processId);
+    } else {
+        const int on = 1;
+        setsockopt(file, IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
+    }
+    if (connections.size() >= mostConnections) {
+        close(file);
+        return;
+    }
+    connections.push_back(std::make_unique<Connection>(
+        *this, file, std::make_unique<Exports>(*this, listener.offered, peer, !listener.unixSocket), peer));
+    connections.back()->Begin();
+}
+
+void UsbIpServer::Serve(int connectedSocket, const std::string& name) {
+    const auto found = std::ranges::find(exportedInstruments, name, &Exported::name);
+    if (found == exportedInstruments.end()) {
+        close(connectedSocket);
+        throw std::runtime_error("no instrument named \"" + name + "\"");
+    }
+    fcntl(connectedSocket, F_SETFL, O_NONBLOCK);
+    auto exports = std::make_unique<Exports>(*this, std::vector<Exported*>{&*found},
+                                             "the peer of a given socket", false);
+    UsbIpExports::Import import = exports->Take(*found);
+    if (import.status != UsbIp::OperationStatus::Ok) {
+        close(connectedSocket);
+        throw std::runtime_error("\"" + name + "\" is in use");
+    }
+    connections.push_back(std::make_unique<Connection>(*this, connectedSocket, std::move(exports),
+                                                       "the peer of a given socket"));
+    connections.back()->BeginImported(std::move(import.device));
+}
+
+void UsbIpServer::Remove(Connection& connection) {
+    const auto found =
+        std::ranges::find_if(connections, [&](const auto& each) { return each.get() == &connection; });
+    if (found == connections.end()) {
+        return;
+    }
+    connection.Abandon();
+    removed.splice(removed.end(), connections, found);
+    if (cleaning == 0) {
+        cleaning = loop.CallSoon([this] {
+            cleaning = 0;
+            removed.clear();
+        });
+    }
+}
+
+}  // namespace Varnholt::Simulator

@@ -1,0 +1,79 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <list>
+#include <map>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "FaultPlan.h"
+#include "PollLoop.h"
+#include "SimulatedInstrument.h"
+#include "TransferLog.h"
+#include "UsbIpSession.h"
+
+namespace Varnholt::Simulator {
+
+/// Lets other processes use simulated instruments: each on a Unix socket of its own, and, when asked, all of
+/// them on a TCP port of this machine. One import of an instrument at a time. Lives on the loop's thread.
+class UsbIpServer final {
+  public:
+    /// Both must outlive the server. `logger` is told what happens; may be empty.
+    UsbIpServer(PollLoop& pollLoop, Log logger);
+    ~UsbIpServer();
+    UsbIpServer(const UsbIpServer&) = delete;
+    UsbIpServer& operator=(const UsbIpServer&) = delete;
+
+    struct Export {
+        std::string name;
+        std::shared_ptr<SimulatedInstrument> instrument;
+        FaultPlan faults;  ///< counted anew with each import
+        /// Put around what is imported; may be empty.
+        std::function<std::shared_ptr<Platform::Usb::UsbDevice>(std::shared_ptr<Platform::Usb::UsbDevice>)>
+            wrap;
+    };
+    /// Adds an instrument and listens for it. Throws `std::runtime_error` with a text for people.
+    void Add(Export added);
+
+    /// Listens on 127.0.0.1; 0 takes a free port. Answers the port. Throws as above.
+    std::uint16_t ListenTcp(std::uint16_t port);
+
+    /// Serves a connected stream socket whose peer has nothing to import any more, such as a kernel. The
+    /// socket is the server's from then on. Throws as above.
+    void Serve(int connectedSocket, const std::string& name);
+
+    /// The bus id under which TCP peers find an instrument.
+    std::string TcpBusId(const std::string& name) const;
+
+  private:
+    struct Exported;
+    class Exports;
+    class Connection;
+
+    struct Listener {
+        int file;
+        bool unixSocket;
+        std::vector<Exported*> offered;
+    };
+
+    void ListenTo(int file, std::vector<Exported*> offered, bool unixSocket);
+    void Listen();
+    void PauseListening();
+    void Accept(const Listener& listener);
+    /// Ends a connection; it may be one of its own functions that asks.
+    void Remove(Connection& connection);
+    void Tell(const std::string& line) const;
+
+    PollLoop& loop;
+    const Log log;
+    std::list<Exported> exportedInstruments;
+    std::list<Listener> listeners;
+    std::list<std::unique_ptr<Connection>> connections;
+    std::list<std::unique_ptr<Connection>> removed;
+    Platform::EventScheduler::EventId cleaning = 0;
+    Platform::EventScheduler::EventId relistening = 0;
+};
+
+}  // namespace Varnholt::Simulator

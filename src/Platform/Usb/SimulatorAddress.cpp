@@ -1,0 +1,78 @@
+#include "Platform/Usb/SimulatorAddress.h"
+
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstddef>
+#include <cstring>
+#include <string_view>
+#include <utility>
+
+namespace Varnholt::Platform::Usb {
+namespace {
+
+class Address final {
+  public:
+    explicit Address(const std::string& name) {
+        // A leading zero makes the name an abstract one, which is as long as the address says.
+        const std::string path = SimulatorSocketPrefix + name;
+        address.sun_family = AF_UNIX;
+        std::copy_n(path.begin(), std::min(path.size(), sizeof(address.sun_path) - 1), address.sun_path + 1);
+        size = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + 1 + path.size());
+    }
+
+    int MakeSocket(int (*use)(int, const sockaddr*, socklen_t)) const {
+        const int file = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+        if (file >= 0 && use(file, reinterpret_cast<const sockaddr*>(&address), size) != 0) {
+            const int error = errno;
+            close(file);
+            errno = error;
+            return -1;
+        }
+        return file;
+    }
+
+  private:
+    sockaddr_un address{};
+    socklen_t size = 0;
+};
+
+}  // namespace
+
+bool IsSimulatorName(const std::string& name) {
+    constexpr std::string_view allowed = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789-_.";
+    constexpr std::size_t longest = 64;
+    return !name.empty() && name.size() <= longest && name.find_first_not_of(allowed) == std::string::npos;
+}
+
+std::optional<PeerCredentials> CredentialsOfPeer(int socketFile) {
+    ucred credentials{};
+    socklen_t size = sizeof credentials;
+    if (getsockopt(socketFile, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0) {
+        return std::nullopt;
+    }
+    return PeerCredentials{credentials.uid, credentials.pid};
+}
+
+bool IsTrustedUser(std::uint32_t userId) {
+    return userId == geteuid() || userId == 0;
+}
+
+int ListenAsSimulator(const std::string& name) {
+    const int file = Address(name).MakeSocket(bind);
+    constexpr int waitingConnections = 16;
+    if (file >= 0 && listen(file, waitingConnections) != 0) {
+        close(file);
+        return -1;
+    }
+    return file;
+}
+
+int ConnectToSimulator(const std::string& name) {
+    return Address(name).MakeSocket(connect);
+}
+
+}  // namespace Varnholt::Platform::Usb

@@ -1,0 +1,160 @@
+#include "Platform/Usb/SimulatorBus.h"
+
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <fstream>
+#include <optional>
+#include <set>
+#include <sstream>
+
+#include "Platform/Usb/SimulatorAddress.h"
+#include "Platform/Usb/UsbIpDevice.h"
+
+namespace Varnholt::Platform::Usb {
+namespace {
+
+/// The names at which somebody listens.
+std::set<std::string> ListeningNames() {
+    constexpr unsigned long acceptsConnections = 0x10000;
+    const std::string prefix = std::string("@") + SimulatorSocketPrefix;
+    std::set<std::string> names;
+    std::ifstream table("/proc/net/unix");
+    std::string line;
+    while (std::getline(table, line)) {
+        std::istringstream fields(line);
+        std::string address;
+        std::string references;
+        std::string protocol;
+        unsigned long flags = 0;
+        std::string type;
+        std::string state;
+        std::string inode;
+        std::string path;
+        fields >> address >> references >> protocol >> std::hex >> flags >> type >> state >> inode >> path;
+        if (fields && (flags & acceptsConnections) != 0 && path.starts_with(prefix)) {
+            const std::string name = path.substr(prefix.size());
+            if (IsSimulatorName(name)) {
+                names.insert(name);
+            }
+        }
+    }
+    return names;
+}
+
+/// A connection whose other end was looked at.
+struct Connection {
+    int file = -1;
+    PeerCredentials peer{};
+    bool usable = false;
+};
+
+std::optional<Connection> Connect(const std::string& name) {
+    Connection connection;
+    connection.file = ConnectToSimulator(name);
+    if (connection.file < 0) {
+        return std::nullopt;
+    }
+    if (const auto peer = CredentialsOfPeer(connection.file)) {
+        connection.peer = *peer;
+        connection.usable = IsTrustedUser(peer->userId);
+    }
+    return connection;
+}
+
+/// For the USB/IP client.
+int ConnectToUsable(const std::string& name, ErrorCode& error) {
+    const auto connection = Connect(name);
+    if (!connection) {
+        error = errno == EACCES || errno == EPERM ? Errors::AccessDenied : Errors::DeviceNotConnected;
+        return -1;
+    }
+    if (!connection->usable) {
+        close(connection->file);
+        error = Errors::AccessDenied;
+        return -1;
+    }
+    error = Errors::Success;
+    return connection->file;
+}
+
+UsbIpConnector ConnectorTo(const std::string& name) {
+    return [name](ErrorCode& error) { return ConnectToUsable(name, error); };
+}
+
+std::optional<SimulatorInfo> Describe(const std::string& name) {
+    const auto connection = Connect(name);
+    if (!connection) {
+        return std::nullopt;
+    }
+    close(connection->file);
+    SimulatorInfo info;
+    info.name = SimulatedPrefix + name;
+    info.userId = connection->peer.userId;
+    info.processId = connection->peer.processId;
+    info.usable = connection->usable;
+    return info;
+}
+
+/// The simulator writes who has opened the instrument behind its path.
+std::string UserOf(const std::string& name) {
+    const auto records = ListUsbIpDevices(ConnectorTo(name));
+    if (!records || records->empty()) {
+        return {};
+    }
+    const std::string& path = records->front().path;
+    const auto mark = path.find(UsedByMark);
+    return mark == std::string::npos ? std::string() : path.substr(mark + std::string(UsedByMark).size());
+}
+
+class SimulatorsOfThisUser final : public UsbBus {
+  public:
+    std::vector<std::string> List() override {
+        std::vector<std::string> names;
+        for (const std::string& name : ListeningNames()) {
+            if (const auto info = Describe(name); info && info->usable) {
+                names.push_back(info->name);
+            }
+        }
+        return names;
+    }
+
+    std::shared_ptr<UsbDevice> Open(const std::string& prefixedName, ErrorCode& error) override {
+        const std::string prefix = SimulatedPrefix;
+        const std::string name = prefixedName.starts_with(prefix) ? prefixedName.substr(prefix.size()) : "";
+        const auto info = IsSimulatorName(name) ? Describe(name) : std::nullopt;
+        if (!info) {
+            error = Errors::FileNotFound;
+            return nullptr;
+        }
+        if (!info->usable) {
+            error = Errors::AccessDenied;
+            return nullptr;
+        }
+        error = Errors::Success;
+        return MakeUsbIpDevice(ConnectorTo(name), SimulatorBusId);
+    }
+};
+
+}  // namespace
+
+std::vector<SimulatorInfo> ListSimulators() {
+    std::vector<SimulatorInfo> simulators;
+    for (const std::string& name : ListeningNames()) {
+        if (auto info = Describe(name)) {
+            if (info->usable) {
+                info->usedBy = UserOf(name);
+            }
+            simulators.push_back(std::move(*info));
+        }
+    }
+    return simulators;
+}
+
+UsbBus& SimulatorBus() {
+    static SimulatorsOfThisUser bus;
+    return bus;
+}
+
+}  // namespace Varnholt::Platform::Usb

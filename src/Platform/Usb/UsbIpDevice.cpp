@@ -1,0 +1,433 @@
+#include "Platform/Usb/UsbIpDevice.h"
+
+#include <pthread.h>
+#include <signal.h>
+
+#include <algorithm>
+#include <array>
+#include <condition_variable>
+#include <mutex>
+#include <new>
+#include <system_error>
+#include <thread>
+#include <utility>
+
+#include "Platform/Usb/UsbDescriptors.h"
+#include "Platform/Usb/UsbIpSocket.h"
+#include "Protocol/ByteOrder.h"
+
+namespace Varnholt::Platform::Usb {
+namespace {
+
+using Clock = UsbIpSocket::Clock;
+
+/// A peer that does not answer a cancellation by then is given up.
+constexpr auto UnlinkPatience = std::chrono::milliseconds(1000);
+/// For what the device itself is asked on behalf of the layers above.
+constexpr auto RequestPatience = std::chrono::milliseconds(2000);
+
+std::unique_ptr<UsbIpSocket> Connect(const UsbIpConnector& connect, ErrorCode& error) {
+    error = Errors::DeviceNotConnected;
+    const int file = connect(error);
+    return file < 0 ? nullptr : std::make_unique<UsbIpSocket>(file);
+}
+
+/// Sends an operation's request and receives the header of its reply.
+std::optional<UsbIp::OperationHeader> Ask(UsbIpSocket& socket, UsbIp::Operation request,
+                                          std::span<const std::uint8_t> argument, UsbIp::Operation reply) {
+    UsbIp::OperationHeader header;
+    header.operation = request;
+    UsbIp::OperationBytes bytes = UsbIp::Encode(header);
+    if (!socket.Send(bytes, argument) || !socket.Receive(bytes, true)) {
+        return std::nullopt;
+    }
+    header = UsbIp::DecodeOperation(bytes);
+    return header.operation == reply ? std::optional(header) : std::nullopt;
+}
+
+ErrorCode ErrorOfImport(UsbIp::OperationStatus status) {
+    switch (status) {
+        case UsbIp::OperationStatus::Ok:
+            return Errors::Success;
+        case UsbIp::OperationStatus::NotAvailable:
+        case UsbIp::OperationStatus::Busy:
+            return Errors::Busy;
+        case UsbIp::OperationStatus::NoDevice:
+            return Errors::DeviceNotConnected;
+        case UsbIp::OperationStatus::Failed:
+            break;
+    }
+    return Errors::GeneralFailure;
+}
+
+/// A transfer of the device's own, waited for.
+class WaitedTransfer final : public Transfer, private TransferClient {
+  public:
+    WaitedTransfer(const SetupPacket& packet, std::vector<std::uint8_t>& buffer) {
+        setup = packet;
+        data = buffer.data();
+        length = static_cast<std::uint32_t>(buffer.size());
+        client = this;
+    }
+
+    ErrorCode Do(UsbDevice& device) {
+        if (const ErrorCode code = device.Submit(*this); code != Errors::Success) {
+            return code;
+        }
+        std::unique_lock lock(mutex);
+        if (!completion.wait_for(lock, RequestPatience, [this] { return completed; })) {
+            lock.unlock();
+            device.Cancel(*this);
+            lock.lock();
+            completion.wait(lock, [this] { return completed; });
+        }
+        switch (status) {
+            case TransferStatus::Completed:
+                return Errors::Success;
+            case TransferStatus::DeviceGone:
+                return Errors::DeviceNotConnected;
+            default:
+                return Errors::GeneralFailure;
+        }
+    }
+
+  private:
+    void TransferCompleted(Transfer&) noexcept override {
+        const std::lock_guard lock(mutex);
+        completed = true;
+        completion.notify_all();
+    }
+
+    std::mutex mutex;
+    std::condition_variable completion;
+    bool completed = false;
+};
+
+class UsbIpDevice final : public UsbDevice {
+  public:
+    UsbIpDevice(UsbIpConnector connector, std::string id)
+        : connect(std::move(connector)), busId(std::move(id)) {}
+    ~UsbIpDevice() override { Release(); }
+
+    std::vector<EndpointInfo> Endpoints() override;
+    ErrorCode Claim() override;
+    void Release() override;
+    ErrorCode Submit(Transfer& transfer) override;
+    void Cancel(Transfer& transfer) override;
+    ErrorCode ClearHalt(std::uint8_t endpoint) override;
+
+  private:
+    struct Running {
+        Transfer* transfer;
+        std::uint32_t sequence;
+        std::uint32_t unlinkSequence = 0;
+        Clock::time_point unlinkLimit{};
+    };
+
+    ErrorCode Import(UsbIpSocket& newSocket);
+    void Listen();
+    bool HandleReply(const UsbIp::SubmitReply& reply);
+    bool HandleReply(const UsbIp::UnlinkReply& reply);
+    void Complete(Transfer& transfer, TransferStatus status, std::uint32_t actualLength);
+
+    // Called with `mutex` held.
+    std::uint32_t NextSequence() { return ++lastSequence == 0 ? ++lastSequence : lastSequence; }
+    void LimitReceiving();
+
+    const UsbIpConnector connect;
+    const std::string busId;
+
+    bool Claimed();
+
+    std::mutex claimMutex;  // taken first; held while what follows changes
+    std::unique_ptr<UsbIpSocket> socket;
+    std::uint32_t deviceId = 0;
+    std::thread reader;
+    std::vector<EndpointInfo> endpoints;
+
+    std::mutex sendMutex;  // taken second: packets leave in the order in which they are entered below
+    std::mutex mutex;      // taken last; guards what follows
+    std::vector<Running> running;
+    std::uint32_t lastSequence = 0;
+    bool connected = false;
+    bool releasing = false;
+};
+
+ErrorCode UsbIpDevice::Claim() {
+    const std::lock_guard claimLock(claimMutex);
+    if (socket) {
+        const std::lock_guard lock(mutex);
+        return connected ? Errors::Success : Errors::DeviceNotConnected;
+    }
+    ErrorCode error = Errors::Success;
+    std::unique_ptr<UsbIpSocket> newSocket = Connect(connect, error);
+    if (!newSocket) {
+        return error;
+    }
+    if (error = Import(*newSocket); error != Errors::Success) {
+        return error;
+    }
+    socket = std::move(newSocket);
+    {
+        const std::lock_guard lock(mutex);
+        connected = true;
+        releasing = false;
+    }
+    // Signals are the host program's business: its own threads take them.
+    sigset_t all;
+    sigset_t before;
+    sigfillset(&all);
+    pthread_sigmask(SIG_SETMASK, &all, &before);
+    try {
+        reader = std::thread([this] { Listen(); });
+    } catch (const std::system_error&) {
+        socket.reset();
+        const std::lock_guard lock(mutex);
+        connected = false;
+        error = Errors::NoSystemResources;
+    }
+    pthread_sigmask(SIG_SETMASK, &before, nullptr);
+    return error;
+}
+
+ErrorCode UsbIpDevice::Import(UsbIpSocket& newSocket) {
+    const UsbIp::BusIdBytes id = UsbIp::EncodeBusId(busId);
+    const auto reply = Ask(newSocket, UsbIp::Operation::ImportRequest, id, UsbIp::Operation::ImportReply);
+    if (!reply) {
+        return Errors::DeviceNotConnected;
+    }
+    if (reply->status != UsbIp::OperationStatus::Ok) {
+        return ErrorOfImport(reply->status);
+    }
+    UsbIp::DeviceRecordBytes bytes{};
+    if (!newSocket.Receive(bytes, true)) {
+        return Errors::DeviceNotConnected;
+    }
+    deviceId = UsbIp::DecodeDeviceRecord(bytes).DeviceId();
+    return Errors::Success;
+}
+
+void UsbIpDevice::Release() {
+    const std::lock_guard claimLock(claimMutex);
+    if (!socket) {
+        return;
+    }
+    {
+        const std::lock_guard lock(mutex);
+        releasing = true;
+    }
+    socket->Shutdown();
+    reader.join();
+    const std::lock_guard sendLock(sendMutex);  // nobody is sending any more
+    socket.reset();
+}
+
+ErrorCode UsbIpDevice::Submit(Transfer& transfer) try {
+    if (transfer.length > UsbIp::MaximumPayload) {
+        return Errors::InvalidParameter;
+    }
+    UsbIp::SubmitPacket packet;
+    packet.endpoint = transfer.endpoint;
+    packet.in = transfer.IsIn();
+    packet.length = transfer.length;
+    packet.setup = transfer.endpoint == 0 ? transfer.setup : SetupPacket{};
+
+    const std::lock_guard sendLock(sendMutex);
+    {
+        const std::lock_guard lock(mutex);
+        if (!connected) {
+            return Errors::DeviceNotConnected;
+        }
+        packet.sequence = NextSequence();
+        transfer.actualLength = 0;
+        running.push_back({&transfer, packet.sequence});
+    }
+    packet.deviceId = deviceId;
+    const std::span<const std::uint8_t> payload(transfer.data, packet.in ? 0 : packet.length);
+    if (!socket->Send(UsbIp::Encode(packet), payload)) {
+        socket->Shutdown();  // the reader ends every transfer, this one too
+    }
+    return Errors::Success;
+} catch (const std::bad_alloc&) {
+    return Errors::NotEnoughMemory;
+}
+
+void UsbIpDevice::Cancel(Transfer& transfer) {
+    const std::lock_guard sendLock(sendMutex);
+    UsbIp::UnlinkPacket packet;
+    {
+        const std::lock_guard lock(mutex);
+        const auto found = std::ranges::find(running, &transfer, &Running::transfer);
+        if (found == running.end() || found->unlinkSequence != 0) {
+            return;
+        }
+        packet.sequence = found->unlinkSequence = NextSequence();
+        packet.victim = found->sequence;
+        found->unlinkLimit = Clock::now() + UnlinkPatience;
+        LimitReceiving();
+    }
+    packet.deviceId = deviceId;
+    if (!socket->Send(UsbIp::Encode(packet), {})) {
+        socket->Shutdown();
+    }
+}
+
+void UsbIpDevice::LimitReceiving() {
+    std::optional<Clock::time_point> limit;
+    for (const Running& each : running) {
+        if (each.unlinkSequence != 0 && (!limit || each.unlinkLimit < *limit)) {
+            limit = each.unlinkLimit;
+        }
+    }
+    socket->ReceiveUntil(limit);
+}
+
+void UsbIpDevice::Listen() {
+    const auto handle = [this](const auto& packet) {
+        if constexpr (requires { HandleReply(packet); }) {
+            return HandleReply(packet);
+        }
+        return false;
+    };
+    UsbIp::PacketBytes bytes{};
+    while (socket->Receive(bytes, false)) {
+        const auto packet = UsbIp::DecodePacket(bytes);
+        if (!packet || !std::visit(handle, *packet)) {
+            break;
+        }
+    }
+    socket->Shutdown();
+    std::vector<Running> left;
+    TransferStatus status = TransferStatus::DeviceGone;
+    {
+        const std::lock_guard lock(mutex);
+        connected = false;
+        left.swap(running);
+        status = releasing ? TransferStatus::Cancelled : TransferStatus::DeviceGone;
+    }
+    for (const Running& each : left) {
+        each.transfer->status = status;
+        each.transfer->client->TransferCompleted(*each.transfer);
+    }
+}
+
+bool UsbIpDevice::HandleReply(const UsbIp::SubmitReply& reply) {
+    Transfer* transfer = nullptr;
+    {
+        const std::lock_guard lock(mutex);
+        const auto found = std::ranges::find(running, reply.sequence, &Running::sequence);
+        if (found == running.end()) {
+            return false;
+        }
+        transfer = found->transfer;
+    }
+    if (reply.actualLength > transfer->length ||
+        (transfer->IsIn() && !socket->Receive({transfer->data, reply.actualLength}, true))) {
+        return false;
+    }
+    Complete(*transfer, UsbIp::TransferStatusOf(reply.status), reply.actualLength);
+    return true;
+}
+
+bool UsbIpDevice::HandleReply(const UsbIp::UnlinkReply& reply) {
+    Transfer* transfer = nullptr;
+    {
+        const std::lock_guard lock(mutex);
+        const auto found = std::ranges::find(running, reply.sequence, &Running::unlinkSequence);
+        if (found == running.end() || reply.sequence == 0) {
+            return true;  // its transfer was answered while the cancellation was on its way
+        }
+        transfer = found->transfer;
+    }
+    Complete(*transfer, TransferStatus::Cancelled, 0);
+    return true;
+}
+
+void UsbIpDevice::Complete(Transfer& transfer, TransferStatus status, std::uint32_t actualLength) {
+    transfer.status = status;
+    transfer.actualLength = actualLength;
+    {
+        const std::lock_guard lock(mutex);
+        std::erase_if(running, [&](const Running& each) { return each.transfer == &transfer; });
+        LimitReceiving();
+    }
+    transfer.client->TransferCompleted(transfer);
+}
+
+std::vector<EndpointInfo> UsbIpDevice::Endpoints() {
+    {
+        const std::lock_guard claimLock(claimMutex);
+        if (!endpoints.empty()) {
+            return endpoints;
+        }
+    }
+    // The descriptors come over the connection, which there is only during a claim.
+    const bool claimed = Claimed();
+    std::vector<EndpointInfo> found;
+    if (claimed || Claim() == Errors::Success) {
+        constexpr SetupPacket getConfiguration{0x80, 6, 0x0200, 0, 255};
+        std::vector<std::uint8_t> bytes(getConfiguration.length);
+        WaitedTransfer transfer(getConfiguration, bytes);
+        if (transfer.Do(*this) == Errors::Success) {
+            bytes.resize(transfer.actualLength);
+            found = EndpointsOfFirstInterface(bytes);
+        }
+        if (!claimed) {
+            Release();
+        }
+    }
+    const std::lock_guard claimLock(claimMutex);
+    endpoints = found;
+    return found;
+}
+
+bool UsbIpDevice::Claimed() {
+    const std::lock_guard claimLock(claimMutex);
+    return socket != nullptr;
+}
+
+ErrorCode UsbIpDevice::ClearHalt(std::uint8_t endpoint) {
+    constexpr std::uint8_t toEndpoint = 0x02;
+    constexpr std::uint8_t clearFeature = 1;
+    std::vector<std::uint8_t> nothing;
+    return WaitedTransfer({toEndpoint, clearFeature, 0, endpoint, 0}, nothing).Do(*this);
+}
+
+}  // namespace
+
+std::shared_ptr<UsbDevice> MakeUsbIpDevice(UsbIpConnector connect, std::string busId) {
+    return std::make_shared<UsbIpDevice>(std::move(connect), std::move(busId));
+}
+
+std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(const UsbIpConnector& connect) {
+    constexpr std::uint32_t mostDevices = 256;
+    ErrorCode error = Errors::Success;
+    const auto socket = Connect(connect, error);
+    if (!socket) {
+        return std::nullopt;
+    }
+    const auto reply = Ask(*socket, UsbIp::Operation::ListRequest, {}, UsbIp::Operation::ListReply);
+    std::array<std::uint8_t, UsbIp::ListCountSize> countBytes{};
+    if (!reply || reply->status != UsbIp::OperationStatus::Ok || !socket->Receive(countBytes, true)) {
+        return std::nullopt;
+    }
+    const std::uint32_t count = Protocol::LoadBig32(countBytes.data());
+    if (count > mostDevices) {
+        return std::nullopt;
+    }
+    std::vector<UsbIp::DeviceRecord> records;
+    for (std::uint32_t i = 0; i < count; ++i) {
+        UsbIp::DeviceRecordBytes bytes{};
+        if (!socket->Receive(bytes, true)) {
+            return std::nullopt;
+        }
+        records.push_back(UsbIp::DecodeDeviceRecord(bytes));
+        std::vector<std::uint8_t> interfaces(records.back().interfaces * UsbIp::InterfaceRecordSize);
+        if (!socket->Receive(interfaces, true)) {
+            return std::nullopt;
+        }
+    }
+    return records;
+}
+
+}  // namespace Varnholt::Platform::Usb

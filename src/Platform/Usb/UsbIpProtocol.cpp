@@ -1,0 +1,267 @@
+#include "Platform/Usb/UsbIpProtocol.h"
+
+#include <algorithm>
+
+#include "Protocol/ByteOrder.h"
+
+namespace Varnholt::Platform::Usb::UsbIp {
+namespace {
+
+/// Walks over a message of fixed size, field by field. Fields beyond its end are not written and read as 0.
+template <class Byte>
+class Cursor {
+  protected:
+    explicit Cursor(std::span<Byte> message) : rest(message) {}
+
+    std::span<Byte> Take(std::size_t size) {
+        if (size > rest.size()) {
+            rest = {};
+            return {};
+        }
+        const auto field = rest.first(size);
+        rest = rest.subspan(size);
+        return field;
+    }
+
+  private:
+    std::span<Byte> rest;
+};
+
+class Writer final : Cursor<std::uint8_t> {
+  public:
+    explicit Writer(std::span<std::uint8_t> message) : Cursor(message) {}
+
+    Writer& Byte(std::uint8_t value) {
+        if (const auto field = Take(1); !field.empty()) {
+            field[0] = value;
+        }
+        return *this;
+    }
+    Writer& Big16(std::uint16_t value) {
+        if (const auto field = Take(2); !field.empty()) {
+            Protocol::StoreBig16(field.data(), value);
+        }
+        return *this;
+    }
+    Writer& Big32(std::uint32_t value) {
+        if (const auto field = Take(4); !field.empty()) {
+            Protocol::StoreBig32(field.data(), value);
+        }
+        return *this;
+    }
+    Writer& Little16(std::uint16_t value) {
+        if (const auto field = Take(2); !field.empty()) {
+            Protocol::StoreLittle16(field.data(), value);
+        }
+        return *this;
+    }
+    /// Zero-terminated, padded with zeros.
+    Writer& Text(const std::string& text, std::size_t size) {
+        const auto field = Take(size);
+        std::ranges::fill(field, std::uint8_t{0});
+        if (!field.empty()) {
+            std::copy_n(text.begin(), std::min(text.size(), size - 1), field.begin());
+        }
+        return *this;
+    }
+};
+
+class Reader final : Cursor<const std::uint8_t> {
+  public:
+    explicit Reader(std::span<const std::uint8_t> message) : Cursor(message) {}
+
+    std::uint8_t Byte() {
+        const auto field = Take(1);
+        return field.empty() ? std::uint8_t{0} : field[0];
+    }
+    std::uint16_t Big16() {
+        const auto field = Take(2);
+        return field.empty() ? std::uint16_t{0} : Protocol::LoadBig16(field.data());
+    }
+    std::uint32_t Big32() {
+        const auto field = Take(4);
+        return field.empty() ? 0 : Protocol::LoadBig32(field.data());
+    }
+    std::uint16_t Little16() {
+        const auto field = Take(2);
+        return field.empty() ? std::uint16_t{0} : Protocol::LoadLittle16(field.data());
+    }
+    std::string Text(std::size_t size) {
+        const auto field = Take(size);
+        return {field.begin(), std::ranges::find(field, std::uint8_t{0})};
+    }
+};
+
+enum class Command : std::uint32_t { Submit = 1, Unlink = 2, SubmitReply = 3, UnlinkReply = 4 };
+
+constexpr std::uint32_t Out = 0;
+constexpr std::uint32_t In = 1;
+constexpr std::uint32_t HighestEndpoint = 15;
+/// Packets of an isochronous transfer; other transfers have none, which is written in two ways.
+constexpr std::uint32_t NotIsochronous = 0xFFFFFFFF;
+constexpr std::uint32_t FlagIn = 0x200;
+
+struct StatusNumber {
+    std::int32_t number;
+    TransferStatus status;
+};
+/// The first of a status is the one that is sent.
+constexpr std::array StatusNumbers{
+    StatusNumber{0, TransferStatus::Completed},    StatusNumber{-32, TransferStatus::Stalled},
+    StatusNumber{-71, TransferStatus::IoError},    StatusNumber{-75, TransferStatus::Overflow},
+    StatusNumber{-104, TransferStatus::Cancelled}, StatusNumber{-2, TransferStatus::Cancelled},
+    StatusNumber{-19, TransferStatus::DeviceGone}, StatusNumber{-108, TransferStatus::DeviceGone},
+};
+
+void WriteCommon(Writer& writer, Command command, std::uint32_t sequence, std::uint32_t deviceId = 0,
+                 std::uint32_t direction = Out, std::uint32_t endpoint = 0) {
+    writer.Big32(static_cast<std::uint32_t>(command)).Big32(sequence).Big32(deviceId);
+    writer.Big32(direction).Big32(endpoint);
+}
+
+void Write(Writer& writer, const SubmitPacket& packet) {
+    WriteCommon(writer, Command::Submit, packet.sequence, packet.deviceId, packet.in ? In : Out,
+                packet.endpoint & HighestEndpoint);
+    writer.Big32(packet.in ? FlagIn : 0).Big32(packet.length).Big32(0).Big32(0).Big32(packet.interval);
+    writer.Byte(packet.setup.requestType).Byte(packet.setup.request).Little16(packet.setup.value);
+    writer.Little16(packet.setup.index).Little16(packet.setup.length);
+}
+void Write(Writer& writer, const UnlinkPacket& packet) {
+    WriteCommon(writer, Command::Unlink, packet.sequence, packet.deviceId);
+    writer.Big32(packet.victim);
+}
+void Write(Writer& writer, const SubmitReply& reply) {
+    WriteCommon(writer, Command::SubmitReply, reply.sequence);
+    writer.Big32(static_cast<std::uint32_t>(reply.status)).Big32(reply.actualLength);
+}
+void Write(Writer& writer, const UnlinkReply& reply) {
+    WriteCommon(writer, Command::UnlinkReply, reply.sequence);
+    writer.Big32(static_cast<std::uint32_t>(reply.status));
+}
+
+std::optional<Packet> ReadSubmit(Reader& reader, SubmitPacket packet, std::uint32_t direction,
+                                 std::uint32_t endpoint) {
+    reader.Big32();  // flags: the direction is known already
+    packet.length = reader.Big32();
+    reader.Big32();  // start frame
+    const std::uint32_t packets = reader.Big32();
+    packet.interval = reader.Big32();
+    packet.setup.requestType = reader.Byte();
+    packet.setup.request = reader.Byte();
+    packet.setup.value = reader.Little16();
+    packet.setup.index = reader.Little16();
+    packet.setup.length = reader.Little16();
+    if (direction > In || endpoint > HighestEndpoint || packet.length > MaximumPayload ||
+        (packets != 0 && packets != NotIsochronous)) {
+        return std::nullopt;
+    }
+    packet.in = direction == In;
+    packet.endpoint = static_cast<std::uint8_t>(endpoint != 0 && packet.in ? endpoint | 0x80 : endpoint);
+    return packet;
+}
+
+}  // namespace
+
+OperationBytes Encode(const OperationHeader& header) {
+    OperationBytes bytes{};
+    Writer(bytes)
+        .Big16(header.version)
+        .Big16(static_cast<std::uint16_t>(header.operation))
+        .Big32(static_cast<std::uint32_t>(header.status));
+    return bytes;
+}
+
+OperationHeader DecodeOperation(std::span<const std::uint8_t, OperationHeaderSize> bytes) {
+    Reader reader(bytes);
+    OperationHeader header;
+    header.version = reader.Big16();
+    header.operation = static_cast<Operation>(reader.Big16());
+    header.status = static_cast<OperationStatus>(reader.Big32());
+    return header;
+}
+
+DeviceRecordBytes Encode(const DeviceRecord& record) {
+    DeviceRecordBytes bytes{};
+    Writer writer(bytes);
+    writer.Text(record.path, PathSize).Text(record.busId, BusIdSize);
+    writer.Big32(record.busNumber).Big32(record.deviceNumber).Big32(record.speed);
+    writer.Big16(record.vendorId).Big16(record.productId).Big16(record.version);
+    writer.Byte(record.classes[0]).Byte(record.classes[1]).Byte(record.classes[2]);
+    writer.Byte(record.configurationValue).Byte(record.configurations).Byte(record.interfaces);
+    return bytes;
+}
+
+DeviceRecord DecodeDeviceRecord(std::span<const std::uint8_t, DeviceRecordSize> bytes) {
+    Reader reader(bytes);
+    DeviceRecord record;
+    record.path = reader.Text(PathSize);
+    record.busId = reader.Text(BusIdSize);
+    record.busNumber = reader.Big32();
+    record.deviceNumber = reader.Big32();
+    record.speed = reader.Big32();
+    record.vendorId = reader.Big16();
+    record.productId = reader.Big16();
+    record.version = reader.Big16();
+    for (std::uint8_t& number : record.classes) {
+        number = reader.Byte();
+    }
+    record.configurationValue = reader.Byte();
+    record.configurations = reader.Byte();
+    record.interfaces = reader.Byte();
+    return record;
+}
+
+BusIdBytes EncodeBusId(const std::string& busId) {
+    BusIdBytes bytes{};
+    Writer(bytes).Text(busId, BusIdSize);
+    return bytes;
+}
+
+std::string DecodeBusId(std::span<const std::uint8_t, BusIdSize> bytes) {
+    return Reader(bytes).Text(BusIdSize);
+}
+
+PacketBytes Encode(const Packet& packet) {
+    PacketBytes bytes{};
+    Writer writer(bytes);
+    std::visit([&writer](const auto& kind) { Write(writer, kind); }, packet);
+    return bytes;
+}
+
+std::optional<Packet> DecodePacket(std::span<const std::uint8_t, PacketHeaderSize> bytes) {
+    Reader reader(bytes);
+    const auto command = static_cast<Command>(reader.Big32());
+    const std::uint32_t sequence = reader.Big32();
+    const std::uint32_t deviceId = reader.Big32();
+    const std::uint32_t direction = reader.Big32();
+    const std::uint32_t endpoint = reader.Big32();
+    switch (command) {
+        case Command::Submit: {
+            SubmitPacket packet;
+            packet.sequence = sequence;
+            packet.deviceId = deviceId;
+            return ReadSubmit(reader, packet, direction, endpoint);
+        }
+        case Command::Unlink:
+            return UnlinkPacket{sequence, deviceId, reader.Big32()};
+        case Command::SubmitReply: {
+            SubmitReply reply{sequence, static_cast<std::int32_t>(reader.Big32()), 0};
+            reply.actualLength = reader.Big32();
+            return reply.actualLength <= MaximumPayload ? std::optional<Packet>(reply) : std::nullopt;
+        }
+        case Command::UnlinkReply:
+            return UnlinkReply{sequence, static_cast<std::int32_t>(reader.Big32())};
+    }
+    return std::nullopt;
+}
+
+std::int32_t StatusOf(TransferStatus status) {
+    return std::ranges::find(StatusNumbers, status, &StatusNumber::status)->number;
+}
+
+TransferStatus TransferStatusOf(std::int32_t status) {
+    const auto known = std::ranges::find(StatusNumbers, status, &StatusNumber::number);
+    return known == StatusNumbers.end() ? TransferStatus::IoError : known->status;
+}
+
+}  // namespace Varnholt::Platform::Usb::UsbIp

@@ -1,0 +1,356 @@
+// The USB/IP client against a peer that the test plays.
+#include <gtest/gtest.h>
+#include <sys/socket.h>
+#include <sys/time.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstring>
+#include <filesystem>
+#include <functional>
+#include <iterator>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "Platform/Usb/UsbIpDevice.h"
+#include "Platform/Usb/WaitedTransfer.h"
+
+namespace Varnholt::Platform::Usb {
+namespace {
+
+using Bytes = std::vector<std::uint8_t>;
+using Clock = std::chrono::steady_clock;
+using Protocol::BulkInEndpoint;
+using Protocol::BulkOutEndpoint;
+
+template <class Array>
+Bytes operator+(Bytes bytes, const Array& more) {
+    bytes.insert(bytes.end(), more.begin(), more.end());
+    return bytes;
+}
+
+Bytes ImportReply(UsbIp::OperationStatus status = UsbIp::OperationStatus::Ok) {
+    UsbIp::OperationHeader header;
+    header.operation = UsbIp::Operation::ImportReply;
+    header.status = status;
+    const Bytes bytes = Bytes() + UsbIp::Encode(header);
+    if (status != UsbIp::OperationStatus::Ok) {
+        return bytes;
+    }
+    UsbIp::DeviceRecord record;
+    record.busNumber = 3;
+    record.deviceNumber = 4;
+    return bytes + UsbIp::Encode(record);
+}
+
+std::size_t CountEntries(const char* folder) {
+    return static_cast<std::size_t>(std::distance(std::filesystem::directory_iterator(folder), {}));
+}
+
+class UsbIpDeviceTest : public testing::Test {
+  protected:
+    ~UsbIpDeviceTest() override { ClosePeer(); }
+
+    /// A device whose peer has already sent `firstBytes`.
+    std::shared_ptr<UsbDevice> MakeDevice(const Bytes& firstBytes = ImportReply()) {
+        return MakeUsbIpDevice(
+            [this, firstBytes](ErrorCode&) {
+                ClosePeer();
+                int files[2] = {-1, -1};
+                EXPECT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, files));
+                peer = files[1];
+                const timeval patience{10, 0};
+                setsockopt(peer, SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof patience);
+                PeerSends(firstBytes);
+                return files[0];
+            },
+            "1-1");
+    }
+    std::shared_ptr<UsbDevice> MakeClaimedDevice() {
+        auto device = MakeDevice();
+        EXPECT_EQ(Errors::Success, device->Claim());
+        EXPECT_EQ(40U, PeerReceives(40).size());
+        return device;
+    }
+    void ClosePeer() {
+        if (peer >= 0) {
+            close(std::exchange(peer, -1));
+        }
+    }
+    template <class Array>
+    void PeerSends(const Array& bytes) {
+        EXPECT_EQ(static_cast<ssize_t>(bytes.size()), send(peer, bytes.data(), bytes.size(), MSG_NOSIGNAL));
+    }
+    Bytes PeerReceives(std::size_t size) {
+        Bytes bytes(size);
+        const ssize_t count = recv(peer, bytes.data(), size, MSG_WAITALL);
+        bytes.resize(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+        return bytes;
+    }
+    template <class Kind>
+    Kind PeerReceivesPacket() {
+        const Bytes received = PeerReceives(UsbIp::PacketHeaderSize);
+        UsbIp::PacketBytes bytes{};
+        std::ranges::copy(received, bytes.begin());
+        const auto packet = UsbIp::DecodePacket(bytes);
+        if (!packet || !std::holds_alternative<Kind>(*packet)) {
+            ADD_FAILURE() << "another packet";
+            return {};
+        }
+        return std::get<Kind>(*packet);
+    }
+
+    int peer = -1;
+};
+
+TEST_F(UsbIpDeviceTest, ImportAndPacketsAreWhatTheProtocolSays) {
+    const auto device = MakeDevice();
+    ASSERT_EQ(Errors::Success, device->Claim());
+    EXPECT_EQ(Errors::Success, device->Claim()) << "it is this device's already";
+    EXPECT_EQ((Bytes{0x01, 0x11, 0x80, 0x03, 0, 0, 0, 0, '1', '-', '1'} + Bytes(29)), PeerReceives(40));
+
+    WaitedTransfer request(Protocol::Request::Reset, {31});
+    WaitedTransfer readout(BulkInEndpoint, WaitedTransfer::Room(256));
+    ASSERT_EQ(Errors::Success, device->Submit(request));
+    ASSERT_EQ(Errors::Success, device->Submit(readout));
+
+    const auto first = PeerReceivesPacket<UsbIp::SubmitPacket>();
+    EXPECT_EQ((SetupPacket{0x40, 0xCA, 0, 0, 1}), first.setup);
+    EXPECT_EQ(0x00030004U, first.deviceId);
+    EXPECT_EQ(1U, first.length);
+    EXPECT_EQ(Bytes{31}, PeerReceives(1));
+    const auto second = PeerReceivesPacket<UsbIp::SubmitPacket>();
+    EXPECT_EQ(BulkInEndpoint, second.endpoint);
+    EXPECT_EQ(256U, second.length);
+    EXPECT_NE(first.sequence, second.sequence);
+
+    // Answered in the other order.
+    PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{second.sequence, 0, 3}) + Bytes{7, 8, 9});
+    ASSERT_TRUE(readout.Wait());
+    EXPECT_EQ(TransferStatus::Completed, readout.status);
+    EXPECT_EQ((Bytes{7, 8, 9}), readout.Data());
+    EXPECT_EQ(0, request.Completions());
+    PeerSends(UsbIp::Encode(UsbIp::SubmitReply{first.sequence, -32, 0}));
+    ASSERT_TRUE(request.Wait());
+    EXPECT_EQ(TransferStatus::Stalled, request.status);
+}
+
+TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
+    struct Case {
+        const char* name;
+        std::optional<std::int32_t> submitStatus;  ///< answered although the unlink has arrived
+        Bytes data;
+        std::int32_t unlinkStatus;
+        TransferStatus expected;
+    };
+    const auto device = MakeClaimedDevice();
+    for (const Case& test : {
+             Case{"unlinked", std::nullopt, {}, -104, TransferStatus::Cancelled},
+             Case{"answered meanwhile", 0, {1, 2, 3, 4}, 0, TransferStatus::Completed},
+             Case{"unlinked with data", -104, {1, 2}, 0, TransferStatus::Cancelled},
+             Case{"the peer believes it has answered", std::nullopt, {}, 0, TransferStatus::Cancelled},
+         }) {
+        WaitedTransfer transfer(BulkInEndpoint, WaitedTransfer::Room(4));
+        ASSERT_EQ(Errors::Success, device->Submit(transfer));
+        const auto submit = PeerReceivesPacket<UsbIp::SubmitPacket>();
+        device->Cancel(transfer);
+        device->Cancel(transfer);
+        const auto unlink = PeerReceivesPacket<UsbIp::UnlinkPacket>();
+        EXPECT_EQ(submit.sequence, unlink.victim) << test.name;
+        if (test.submitStatus) {
+            const auto length = static_cast<std::uint32_t>(test.data.size());
+            PeerSends(Bytes() +
+                      UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, *test.submitStatus, length}) +
+                      test.data);
+        }
+        PeerSends(UsbIp::Encode(UsbIp::UnlinkReply{unlink.sequence, test.unlinkStatus}));
+        ASSERT_TRUE(transfer.Wait()) << test.name;
+        EXPECT_EQ(test.expected, transfer.status) << test.name;
+        EXPECT_EQ(test.data, transfer.Data()) << test.name;
+        device->Cancel(transfer);
+    }
+    // The connection has survived it, and nothing more was sent.
+    WaitedTransfer last(BulkInEndpoint, WaitedTransfer::Room(1));
+    device->Submit(last);
+    const auto submit = PeerReceivesPacket<UsbIp::SubmitPacket>();
+    PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 1}) + Bytes{9});
+    ASSERT_TRUE(last.Wait());
+    EXPECT_EQ(1, last.Completions());
+}
+
+TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
+    using Misdeed = std::function<void(const UsbIp::SubmitPacket&)>;
+    struct Case {
+        const char* name;
+        Misdeed misdeed;
+    };
+    for (const Case& test : {
+             Case{"leaves", [&](auto&) { ClosePeer(); }},
+             Case{"leaves in the middle of the data",
+                  [&](auto& submit) {
+                      PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 64}) +
+                                Bytes(32));
+                      ClosePeer();
+                  }},
+             Case{"answers what was not asked",
+                  [&](auto& submit) {
+                      PeerSends(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence + 100, 0, 0}));
+                  }},
+             Case{"sends more than was asked for",
+                  [&](auto& submit) {
+                      PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 65}) +
+                                Bytes(65));
+                  }},
+             Case{"announces 4 GB",
+                  [&](auto& submit) {
+                      PeerSends(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 0xFFFFFFFF}));
+                  }},
+             Case{"submits to a host", [&](auto& submit) { PeerSends(UsbIp::Encode(submit)); }},
+             Case{"sends garbage", [&](auto&) { PeerSends(Bytes(48, 0x5A)); }},
+             Case{"stops in the middle of a header", [&](auto&) { PeerSends(Bytes(20)); }},
+             Case{"stops in the middle of the data",
+                  [&](auto& submit) {
+                      PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 64}) +
+                                Bytes(32));
+                  }},
+         }) {
+        const auto device = MakeClaimedDevice();
+        WaitedTransfer first(BulkInEndpoint, WaitedTransfer::Room(64));
+        WaitedTransfer second(BulkOutEndpoint, Bytes(64));
+        ASSERT_EQ(Errors::Success, device->Submit(first));
+        ASSERT_EQ(Errors::Success, device->Submit(second));
+        test.misdeed(PeerReceivesPacket<UsbIp::SubmitPacket>());
+        ASSERT_TRUE(first.Wait()) << test.name;
+        ASSERT_TRUE(second.Wait()) << test.name;
+        EXPECT_EQ(TransferStatus::DeviceGone, first.status) << test.name;
+        EXPECT_EQ(TransferStatus::DeviceGone, second.status) << test.name;
+        WaitedTransfer after(BulkInEndpoint, WaitedTransfer::Room(64));
+        EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(after)) << test.name;
+        EXPECT_EQ(Errors::DeviceNotConnected, device->Claim()) << test.name;
+        device->Release();
+        EXPECT_EQ(Errors::Success, device->Claim()) << test.name << ": a new connection";
+    }
+}
+
+TEST_F(UsbIpDeviceTest, SilentPeerDoesNotHoldUpACancellation) {
+    const auto device = MakeClaimedDevice();
+    WaitedTransfer cancelled(BulkInEndpoint, WaitedTransfer::Room(64));
+    WaitedTransfer other(Protocol::InterruptInEndpoint, WaitedTransfer::Room(1));
+    device->Submit(cancelled);
+    device->Submit(other);
+    EXPECT_FALSE(other.Wait(std::chrono::milliseconds(100)));
+    const auto start = Clock::now();
+    device->Cancel(cancelled);
+    ASSERT_TRUE(cancelled.Wait());
+    ASSERT_TRUE(other.Wait());
+    EXPECT_LT(Clock::now() - start, std::chrono::seconds(3));
+    EXPECT_EQ(TransferStatus::DeviceGone, cancelled.status);
+    EXPECT_EQ(TransferStatus::DeviceGone, other.status);
+}
+
+TEST_F(UsbIpDeviceTest, PeerThatDoesNotReadDoesNotHoldUpASubmission) {
+    const auto device = MakeClaimedDevice();
+    WaitedTransfer large(BulkOutEndpoint, Bytes(4U << 20));
+    const auto start = Clock::now();
+    ASSERT_EQ(Errors::Success, device->Submit(large));
+    ASSERT_TRUE(large.Wait());
+    EXPECT_LT(Clock::now() - start, std::chrono::seconds(5));
+    EXPECT_EQ(TransferStatus::DeviceGone, large.status);
+    WaitedTransfer tooLarge(BulkOutEndpoint, Bytes(UsbIp::MaximumPayload + std::size_t{1}));
+    EXPECT_EQ(Errors::InvalidParameter, device->Submit(tooLarge));
+}
+
+TEST_F(UsbIpDeviceTest, ImportFailuresAreToldApart) {
+    struct Case {
+        const char* name;
+        Bytes reply;
+        ErrorCode expected;
+    };
+    Bytes otherOperation = ImportReply();
+    otherOperation[3] = 0x05;
+    Bytes half = ImportReply();
+    half.resize(100);
+    for (const Case& test : {
+             Case{"busy", ImportReply(UsbIp::OperationStatus::Busy), Errors::Busy},
+             Case{"not available", ImportReply(UsbIp::OperationStatus::NotAvailable), Errors::Busy},
+             Case{"no such device", ImportReply(UsbIp::OperationStatus::NoDevice),
+                  Errors::DeviceNotConnected},
+             Case{"failed", ImportReply(UsbIp::OperationStatus::Failed), Errors::GeneralFailure},
+             Case{"another operation", otherOperation, Errors::DeviceNotConnected},
+             Case{"half a record, then silence", half, Errors::DeviceNotConnected},
+             Case{"silence", {}, Errors::DeviceNotConnected},
+         }) {
+        const auto device = MakeDevice(test.reply);
+        const auto start = Clock::now();
+        EXPECT_EQ(test.expected, device->Claim()) << test.name;
+        EXPECT_LT(Clock::now() - start, std::chrono::seconds(5)) << test.name;
+        WaitedTransfer transfer(BulkInEndpoint, WaitedTransfer::Room(1));
+        EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(transfer)) << test.name;
+    }
+    const auto unreachable = MakeUsbIpDevice(
+        [](ErrorCode& error) {
+            error = Errors::AccessDenied;
+            return -1;
+        },
+        "1-1");
+    EXPECT_EQ(Errors::AccessDenied, unreachable->Claim());
+}
+
+TEST_F(UsbIpDeviceTest, ReleaseEndsTransfersAndLeavesNothingBehind) {
+    const std::size_t threads = CountEntries("/proc/self/task");
+    const std::size_t files = CountEntries("/proc/self/fd");
+    WaitedTransfer transfer(BulkInEndpoint, WaitedTransfer::Room(64));
+    {
+        const auto device = MakeClaimedDevice();
+        EXPECT_EQ(threads + 1, CountEntries("/proc/self/task"));
+        device->Submit(transfer);
+    }
+    EXPECT_EQ(1, transfer.Completions());
+    EXPECT_EQ(TransferStatus::Cancelled, transfer.status);
+    ClosePeer();
+    EXPECT_EQ(threads, CountEntries("/proc/self/task"));
+    EXPECT_EQ(files, CountEntries("/proc/self/fd"));
+}
+
+TEST(UsbIpListTest, ListsAreReadWithinTheirBounds) {
+    UsbIp::OperationHeader header;
+    header.operation = UsbIp::Operation::ListReply;
+    UsbIp::DeviceRecord record;
+    record.busId = "1-7";
+    record.interfaces = 2;
+    const Bytes start = Bytes() + UsbIp::Encode(header);
+    const Bytes entry = Bytes() + UsbIp::Encode(record) + Bytes(2 * UsbIp::InterfaceRecordSize);
+    struct Case {
+        const char* name;
+        Bytes reply;
+        std::optional<std::size_t> devices;
+    };
+    for (const Case& test : {
+             Case{"none", start + Bytes(4), 0},
+             Case{"two", start + Bytes{0, 0, 0, 2} + entry + entry, 2},
+             Case{"fewer than announced", start + Bytes{0, 0, 0, 2} + entry, std::nullopt},
+             Case{"far too many", start + Bytes{0xFF, 0xFF, 0xFF, 0xFF}, std::nullopt},
+             Case{"another reply", ImportReply(), std::nullopt},
+         }) {
+        int peer = -1;
+        const auto records = ListUsbIpDevices([&](ErrorCode&) {
+            int files[2] = {-1, -1};
+            EXPECT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, files));
+            EXPECT_EQ(static_cast<ssize_t>(test.reply.size()),
+                      send(files[1], test.reply.data(), test.reply.size(), 0));
+            shutdown(files[1], SHUT_WR);
+            peer = files[1];
+            return files[0];
+        });
+        close(peer);
+        EXPECT_EQ(test.devices, records ? std::optional(records->size()) : std::nullopt) << test.name;
+        if (records && !records->empty()) {
+            EXPECT_EQ("1-7", records->front().busId);
+        }
+    }
+}
+
+}  // namespace
+}  // namespace Varnholt::Platform::Usb
