@@ -9,6 +9,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <cstring>
 #include <fstream>
@@ -199,32 +200,27 @@ class UsbIpServer::Connection final {
     }
 
     void Ready() {
-        bool lost = false;
-        // The buffer's size bounds how long one peer keeps the others waiting.
-        std::array<std::uint8_t, 65536> buffer;  // NOLINT: filled before it is read
-        if (session->WantsInput()) {
-            const ssize_t count = recv(file, buffer.data(), buffer.size(), MSG_DONTWAIT);
-            lost = count == 0 || (count < 0 && errno != EAGAIN && errno != EINTR);
-            if (count > 0) {
-                session->Receive({buffer.data(), static_cast<std::size_t>(count)});
-            }
-        }
-        lost ? server.Remove(*this) : Flush();
-    }
-
-    void Flush() {
-        while (!session->Output().empty()) {
-            const auto output = session->Output();
-            const ssize_t count = send(file, output.data(), output.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
-            if (count < 0 && errno == EAGAIN) {
-                break;
-            }
-            if (count < 0 && errno != EINTR) {
+        if (session->WantsInput() && inputStart == inputEnd) {
+            const ssize_t count = recv(file, input.data(), input.size(), MSG_DONTWAIT);
+            if (count == 0 || (count < 0 && errno != EAGAIN && errno != EINTR)) {
                 server.Remove(*this);
                 return;
             }
-            session->OutputSent(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+            inputStart = 0;
+            inputEnd = static_cast<std::size_t>(std::max<ssize_t>(count, 0));
         }
+        Flush();
+    }
+
+    /// Lets the session have what was received, and the peer what the session has for it, as far as it goes.
+    void Flush() {
+        do {
+            inputStart += session->Receive(std::span(input).subspan(inputStart, inputEnd - inputStart));
+            if (!SendOutput()) {
+                server.Remove(*this);
+                return;
+            }
+        } while (session->WantsInput() && inputStart < inputEnd);
         if (session->Over() && session->Output().empty()) {
             if (!session->Complaint().empty()) {
                 server.Tell(peerText + ": " + session->Complaint());
@@ -235,11 +231,28 @@ class UsbIpServer::Connection final {
         Watch();
     }
 
+    /// False when the peer is lost.
+    bool SendOutput() {
+        while (!session->Output().empty()) {
+            const auto output = session->Output();
+            const ssize_t count = send(file, output.data(), output.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
+            if (count < 0 && errno != EINTR) {
+                return errno == EAGAIN;
+            }
+            session->OutputSent(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+        }
+        return true;
+    }
+
     UsbIpServer& server;
     const int file;
     const std::string peerText;
     std::unique_ptr<Exports> exports;
     std::unique_ptr<UsbIpSession> session;
+    // Received and not taken yet. Its size bounds how long one peer keeps the others waiting.
+    std::array<std::uint8_t, 65536> input{};
+    std::size_t inputStart = 0;
+    std::size_t inputEnd = 0;
     Platform::EventScheduler::EventId flush = 0;
     short watchedFor = -1;
     bool abandoned = false;

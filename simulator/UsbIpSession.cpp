@@ -42,8 +42,9 @@ void UsbIpSession::Expect(void (UsbIpSession::*handler)(), std::size_t bytes) {
     next = handler;
 }
 
-void UsbIpSession::Receive(std::span<const std::uint8_t> bytes) {
-    while (!bytes.empty() && !over) {
+std::size_t UsbIpSession::Receive(std::span<const std::uint8_t> bytes) {
+    const std::size_t offered = bytes.size();
+    while (!bytes.empty() && WantsInput()) {
         const std::size_t count = std::min(bytes.size(), expected - input.size());
         input.insert(input.end(), bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(count));
         bytes = bytes.subspan(count);
@@ -51,6 +52,7 @@ void UsbIpSession::Receive(std::span<const std::uint8_t> bytes) {
             (this->*next)();
         }
     }
+    return offered - bytes.size();
 }
 
 void UsbIpSession::OutputSent(std::size_t count) {

@@ -41,7 +41,8 @@ class UsbIpSession final : private Platform::Usb::TransferClient {
     UsbIpSession(const UsbIpSession&) = delete;
     UsbIpSession& operator=(const UsbIpSession&) = delete;
 
-    void Receive(std::span<const std::uint8_t> bytes);
+    /// Answers how many of the bytes it has taken; it stops where `WantsInput` becomes false.
+    std::size_t Receive(std::span<const std::uint8_t> bytes);
 
     std::span<const std::uint8_t> Output() const { return std::span(output).subspan(sent); }
     void OutputSent(std::size_t count);

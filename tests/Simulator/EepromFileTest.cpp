@@ -1,0 +1,113 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <fstream>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include "EepromFile.h"
+#include "FreshEeprom.h"
+#include "PollLoop.h"
+#include "Protocol/Instrument.h"
+#include "Simulator/TestTransfer.h"
+
+namespace Varnholt::Simulator {
+namespace {
+
+using Bytes = std::vector<std::uint8_t>;
+using Protocol::Request;
+using testing::HasSubstr;
+
+class EepromFileTest : public testing::Test {
+  protected:
+    EepromFileTest() { std::filesystem::create_directory(folder); }
+    ~EepromFileTest() override { std::filesystem::remove_all(folder); }
+
+    static void WriteFile(const std::string& name, std::size_t size) {
+        std::ofstream(name, std::ios::binary) << std::string(size, 'x');
+    }
+    std::shared_ptr<SimulatedInstrument> MakeInstrument(EepromFile& file) {
+        InstrumentSettings settings;
+        if (file.Exists()) {
+            settings.eeprom = ReadEepromFile(fileName);
+        }
+        settings.memoryChanged = [&file] { file.MemoryChanged(); };
+        auto instrument = std::make_shared<SimulatedInstrument>(loop, settings);
+        file.Keep(instrument);
+        return instrument;
+    }
+    static void WriteByte(SimulatedInstrument& instrument, std::uint8_t address, std::uint8_t value) {
+        TestTransfer request = TestTransfer::Vendor(Request::WriteEeprom, {0, 0, 0, address, 0, 1, 0, 0});
+        TestTransfer data = TestTransfer::Out(Protocol::BulkOutEndpoint, {value});
+        instrument.Submit(request);
+        instrument.Submit(data);
+        EXPECT_EQ(1, data.completions);
+    }
+    void RunLoopFor(std::uint64_t microseconds) {
+        loop.CallAt(loop.Now() + microseconds, [this] { loop.Stop(); });
+        loop.Run();
+    }
+
+    const std::string folder =
+        std::filesystem::temp_directory_path() / ("ostra-eeprom-" + std::to_string(getpid()));
+    const std::string fileName = folder + "/eeprom.bin";
+    PollLoop loop;
+    std::vector<std::string> complaints;
+    const Log log = [this](const std::string& line) { complaints.push_back(line); };
+};
+
+TEST_F(EepromFileTest, MemoryIsThereAgainAfterARestart) {
+    {
+        EepromFile file(loop, fileName, log);
+        const auto instrument = MakeInstrument(file);
+        EXPECT_EQ(FreshEeprom(), ReadEepromFile(fileName)) << "it exists from the start";
+        WriteByte(*instrument, 7, 42);
+        WriteByte(*instrument, 8, 43);
+        RunLoopFor(300'000);
+        EXPECT_EQ(43, ReadEepromFile(fileName)[8]) << "and is written while the program runs";
+        WriteByte(*instrument, 9, 44);
+    }
+    EepromFile file(loop, fileName, log);
+    const auto instrument = MakeInstrument(file);
+    Bytes expected = FreshEeprom();
+    expected[7] = 42;
+    expected[8] = 43;
+    expected[9] = 44;
+    EXPECT_EQ(expected, instrument->Eeprom());
+    EXPECT_EQ(1, std::distance(std::filesystem::directory_iterator(folder), {})) << "nothing else is left";
+    EXPECT_TRUE(complaints.empty());
+}
+
+TEST_F(EepromFileTest, UnusableFilesAreExplained) {
+    struct Case {
+        std::size_t size;
+        const char* explanation;
+    };
+    for (const Case& test : {Case{0, "has 0 bytes, but an EEPROM has 8192"}, Case{8191, "has 8191 bytes"},
+                             Case{8193, "remove this one to begin with a fresh EEPROM"}}) {
+        WriteFile(fileName, test.size);
+        try {
+            ReadEepromFile(fileName);
+            ADD_FAILURE() << test.size;
+        } catch (const std::runtime_error& error) {
+            EXPECT_THAT(error.what(), HasSubstr(test.explanation));
+        }
+    }
+    EXPECT_THROW(ReadEepromFile(folder + "/none"), std::runtime_error);
+    EXPECT_THROW(ReadEepromFile(folder), std::runtime_error);
+}
+
+TEST_F(EepromFileTest, FailureToWriteIsToldAndKeepsTheOldFile) {
+    EepromFile file(loop, folder + "/missing/eeprom.bin", log);
+    const auto instrument = std::make_shared<SimulatedInstrument>(loop);
+    file.Keep(instrument);
+    ASSERT_EQ(1U, complaints.size());
+    EXPECT_THAT(complaints.front(), HasSubstr("cannot write"));
+}
+
+}  // namespace
+}  // namespace Varnholt::Simulator

@@ -1,0 +1,88 @@
+#pragma once
+
+#include <poll.h>
+#include <sys/eventfd.h>
+#include <unistd.h>
+
+#include <functional>
+#include <future>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "PollLoop.h"
+#include "UsbIpServer.h"
+
+namespace Varnholt::Simulator {
+
+/// A server with its loop on a thread of its own, as if it were another program.
+class ServerThread final {
+  public:
+    ServerThread() : wake(eventfd(0, EFD_CLOEXEC)), server(std::make_unique<UsbIpServer>(loop, Log())) {
+        loop.Watch(wake, POLLIN, [this] { DoTasks(); });
+        thread = std::thread([this] { loop.Run(); });
+    }
+    ~ServerThread() {
+        Do([this] {
+            server.reset();
+            loop.Stop();
+        });
+        thread.join();
+        close(wake);
+    }
+    ServerThread(const ServerThread&) = delete;
+    ServerThread& operator=(const ServerThread&) = delete;
+
+    /// A name that no other test has.
+    static std::string UniqueName(const std::string& stem) {
+        static int number = 0;
+        return "test-" + std::to_string(getpid()) + "-" + std::to_string(++number) + "-" + stem;
+    }
+
+    std::shared_ptr<SimulatedInstrument> Add(const std::string& name, const InstrumentSettings& settings = {},
+                                             const std::string& faults = "") {
+        auto instrument = std::make_shared<SimulatedInstrument>(loop, settings);
+        Do([&] { server->Add({name, instrument, FaultPlan::Parse(faults), {}}); });
+        return instrument;
+    }
+
+    /// Calls `task` on the server's thread and waits for its end; passes on what it throws.
+    void Do(std::function<void()> task) {
+        std::packaged_task<void()> packaged(std::move(task));
+        auto done = packaged.get_future();
+        {
+            const std::lock_guard lock(mutex);
+            tasks.push_back(std::move(packaged));
+        }
+        eventfd_write(wake, 1);
+        done.get();
+    }
+    UsbIpServer& Server() { return *server; }
+    PollLoop& Loop() { return loop; }
+
+  private:
+    void DoTasks() {
+        eventfd_t count = 0;
+        eventfd_read(wake, &count);
+        std::vector<std::packaged_task<void()>> now;
+        {
+            const std::lock_guard lock(mutex);
+            now.swap(tasks);
+        }
+        for (auto& task : now) {
+            task();
+        }
+    }
+
+    const int wake;
+    PollLoop loop;
+    std::unique_ptr<UsbIpServer> server;
+    std::mutex mutex;  // guards `tasks`
+    std::vector<std::packaged_task<void()>> tasks;
+    std::thread thread;
+};
+
+}  // namespace Varnholt::Simulator

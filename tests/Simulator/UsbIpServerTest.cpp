@@ -1,0 +1,422 @@
+// Server and client together, over the sockets that programs use.
+#include <arpa/inet.h>
+#include <gtest/gtest.h>
+#include <netinet/in.h>
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <iterator>
+#include <memory>
+#include <random>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include "Platform/Usb/SimulatorAddress.h"
+#include "Platform/Usb/SimulatorBus.h"
+#include "Platform/Usb/SystemUsbBus.h"
+#include "Platform/Usb/UsbIpDevice.h"
+#include "Platform/Usb/WaitedTransfer.h"
+#include "Protocol/ByteOrder.h"
+#include "Simulator/ServerThread.h"
+#include "UsbIpServer.h"
+
+namespace Varnholt::Simulator {
+namespace {
+
+using Bytes = std::vector<std::uint8_t>;
+using Platform::Usb::ListSimulators;
+using Platform::Usb::SimulatorBus;
+using Platform::Usb::SimulatorInfo;
+using Platform::Usb::TransferStatus;
+using Platform::Usb::UsbDevice;
+using Platform::Usb::WaitedTransfer;
+using Protocol::BulkInEndpoint;
+using Protocol::BulkOutEndpoint;
+using Protocol::InterruptInEndpoint;
+using Protocol::Request;
+namespace Errors = Platform::Errors;
+namespace UsbIp = Platform::Usb::UsbIp;
+
+Bytes AddressAndLength(std::uint32_t address, std::uint16_t length) {
+    Bytes bytes(8);
+    Protocol::StoreBig32(&bytes[0], address);
+    Protocol::StoreBig16(&bytes[4], length);
+    return bytes;
+}
+
+/// Does a transfer and answers the bytes that came.
+Bytes Do(UsbDevice& device, WaitedTransfer&& transfer) {
+    EXPECT_EQ(Errors::Success, device.Submit(transfer));
+    EXPECT_TRUE(transfer.Wait());
+    EXPECT_EQ(TransferStatus::Completed, transfer.status);
+    return transfer.Data();
+}
+
+class UsbIpServerTest : public testing::Test {
+  protected:
+    static std::shared_ptr<UsbDevice> Open(const std::string& name) {
+        Platform::ErrorCode error = Errors::Success;
+        auto device = SimulatorBus().Open("simulated-" + name, error);
+        EXPECT_EQ(Errors::Success, error);
+        return device;
+    }
+    static std::shared_ptr<UsbDevice> OpenAndClaim(const std::string& name) {
+        auto device = Open(name);
+        EXPECT_EQ(Errors::Success, device->Claim());
+        return device;
+    }
+    static bool Listed(const std::string& name) {
+        const auto names = SimulatorBus().List();
+        return std::ranges::find(names, "simulated-" + name) != names.end();
+    }
+    static SimulatorInfo Describe(const std::string& name) {
+        for (const SimulatorInfo& info : ListSimulators()) {
+            if (info.name == "simulated-" + name) {
+                return info;
+            }
+        }
+        ADD_FAILURE() << name << " is not there";
+        return {};
+    }
+
+    const std::string name = ServerThread::UniqueName("a");
+    ServerThread server;
+};
+
+TEST_F(UsbIpServerTest, InstrumentsAreListedByNameForAsLongAsTheyAreThere) {
+    const std::string other = ServerThread::UniqueName("b");
+    EXPECT_FALSE(Listed(name));
+    server.Add(other);
+    server.Add(name);
+    std::vector<std::string> names = Platform::Usb::SystemUsbBus().List();
+    std::erase_if(names, [&](const std::string& each) {
+        return each != "simulated-" + name && each != "simulated-" + other;
+    });
+    EXPECT_EQ((std::vector<std::string>{"simulated-" + name, "simulated-" + other}), names);
+    EXPECT_THROW(server.Add(name), std::runtime_error);
+    EXPECT_THROW(server.Add("a/b"), std::runtime_error);
+    const SimulatorInfo info = Describe(name);
+    EXPECT_TRUE(info.usable);
+    EXPECT_EQ(getpid(), info.processId);
+    EXPECT_EQ(geteuid(), info.userId);
+
+    Platform::ErrorCode error = Errors::Success;
+    for (const char* const unknown : {"simulated-nobody", "simulated-", "simulated-a/b", "usb-1-1"}) {
+        EXPECT_EQ(nullptr, SimulatorBus().Open(unknown, error)) << unknown;
+        EXPECT_EQ(Errors::FileNotFound, error) << unknown;
+    }
+}
+
+TEST_F(UsbIpServerTest, ReadoutAndMemoryTravelBothWays) {
+    const auto instrument = server.Add(name);
+    const auto device = Open(name);
+    const auto endpoints = device->Endpoints();
+    ASSERT_EQ(3U, endpoints.size());
+    EXPECT_EQ(BulkOutEndpoint, endpoints[0].address);
+    EXPECT_FALSE(instrument->Claimed()) << "the question for the endpoints has ended its claim";
+    ASSERT_EQ(Errors::Success, device->Claim());
+
+    Do(*device, WaitedTransfer(Request::SetMeasureParameters, {0x01, 0x26, 0, 0, 0, 1, 6, 0}));
+    Do(*device, WaitedTransfer(Request::Measure, {}));
+    const Bytes readout = Do(*device, WaitedTransfer(BulkInEndpoint, WaitedTransfer::Room(256)));
+    server.Do([&] {
+        EXPECT_EQ(instrument->WithCommands([](Commands& state) { return state.Answers().Expected(0, 256); }),
+                  readout);
+    });
+
+    Do(*device, WaitedTransfer(Request::WriteEeprom, AddressAndLength(300, 3)));
+    Do(*device, WaitedTransfer(BulkOutEndpoint, {1, 2, 3}));
+    Do(*device, WaitedTransfer(BulkOutEndpoint, {0}));
+    Do(*device, WaitedTransfer(BulkOutEndpoint, {0}));
+    Do(*device, WaitedTransfer(Request::ReadEeprom, AddressAndLength(299, 5)));
+    const Bytes memory = Do(*device, WaitedTransfer(BulkInEndpoint, WaitedTransfer::Room(5)));
+    EXPECT_EQ((Bytes{1, 2, 3}), Bytes(memory.begin() + 1, memory.begin() + 4));
+}
+
+TEST_F(UsbIpServerTest, ScanWithTwoTransfersInFlightIsComplete) {
+    constexpr std::uint32_t piece = 65536;
+    constexpr std::uint64_t total = 3 * 1024 * 1024 + 1000;
+    InstrumentSettings settings;
+    settings.scanBytes = total;
+    const auto instrument = server.Add(name, settings);
+    const auto device = OpenAndClaim(name);
+    Do(*device, WaitedTransfer(Request::Measure, {}));
+    Bytes all;
+    auto current = std::make_unique<WaitedTransfer>(BulkInEndpoint, WaitedTransfer::Room(piece));
+    device->Submit(*current);
+    for (;;) {
+        auto next = std::make_unique<WaitedTransfer>(BulkInEndpoint, WaitedTransfer::Room(piece));
+        device->Submit(*next);
+        ASSERT_TRUE(current->Wait());
+        const Bytes data = current->Data();
+        all.insert(all.end(), data.begin(), data.end());
+        std::swap(current, next);
+        if (data.size() < piece) {
+            device->Cancel(*current);
+            ASSERT_TRUE(current->Wait());
+            EXPECT_EQ(TransferStatus::Cancelled, current->status);
+            break;
+        }
+    }
+    server.Do([&] {
+        EXPECT_EQ(
+            instrument->WithCommands([](Commands& state) { return state.Answers().Expected(0, total); }),
+            all);
+    });
+}
+
+TEST_F(UsbIpServerTest, PendingTransfersAreCancelledAndButtonsReported) {
+    const auto instrument = server.Add(name);
+    const auto device = OpenAndClaim(name);
+    WaitedTransfer bulk(BulkInEndpoint, WaitedTransfer::Room(64));
+    WaitedTransfer interrupt(InterruptInEndpoint, WaitedTransfer::Room(8));
+    device->Submit(bulk);
+    device->Submit(interrupt);
+    device->Cancel(bulk);
+    ASSERT_TRUE(bulk.Wait());
+    EXPECT_EQ(TransferStatus::Cancelled, bulk.status);
+    EXPECT_EQ(0, interrupt.Completions());
+    server.Do([&] { instrument->PressButton(); });
+    ASSERT_TRUE(interrupt.Wait());
+    EXPECT_EQ(1U, interrupt.actualLength);
+}
+
+TEST_F(UsbIpServerTest, OneProgramAtATime) {
+    const auto instrument = server.Add(name);
+    const auto first = OpenAndClaim(name);
+    const auto second = Open(name);
+    EXPECT_EQ(Errors::Busy, second->Claim());
+    EXPECT_NE(std::string::npos, Describe(name).usedBy.find("process " + std::to_string(getpid())))
+        << Describe(name).usedBy;
+    first->Release();
+    // The server learns of it a moment later.
+    Platform::ErrorCode code = Errors::Busy;
+    for (int i = 0; i < 1000 && code == Errors::Busy; ++i) {
+        usleep(1000);
+        code = second->Claim();
+    }
+    EXPECT_EQ(Errors::Success, code);
+    second->Release();
+    for (int i = 0; i < 1000 && !Describe(name).usedBy.empty(); ++i) {
+        usleep(1000);
+    }
+    EXPECT_EQ("", Describe(name).usedBy);
+}
+
+TEST_F(UsbIpServerTest, UnpluggedInstrumentIsGoneUntilItIsBack) {
+    const auto instrument = server.Add(name);
+    const auto device = OpenAndClaim(name);
+    WaitedTransfer bulk(BulkInEndpoint, WaitedTransfer::Room(64));
+    WaitedTransfer interrupt(InterruptInEndpoint, WaitedTransfer::Room(1));
+    device->Submit(bulk);
+    device->Submit(interrupt);
+    Do(*device, WaitedTransfer(Request::Reset, {31}));  // so that both have arrived
+    server.Do([&] { instrument->Unplug(); });
+    ASSERT_TRUE(bulk.Wait());
+    ASSERT_TRUE(interrupt.Wait());
+    EXPECT_EQ(TransferStatus::DeviceGone, bulk.status);
+    EXPECT_EQ(TransferStatus::DeviceGone, interrupt.status);
+    EXPECT_EQ(Errors::DeviceNotConnected, Open(name)->Claim());
+    server.Do([&] { instrument->PlugIn(); });
+    EXPECT_EQ(Errors::DeviceNotConnected, device->Claim()) << "this one was unplugged";
+    EXPECT_EQ(Errors::Success, Open(name)->Claim());
+}
+
+TEST_F(UsbIpServerTest, FaultsCrossTheConnection) {
+    server.Add(name, {}, "bulk-in 0:stall; bulk-in 2:late-cancel; control 4:gone-before");
+    for (int round = 0; round < 2; ++round) {
+        const auto device = OpenAndClaim(name);
+        WaitedTransfer stalled(BulkInEndpoint, WaitedTransfer::Room(64));
+        device->Submit(stalled);
+        ASSERT_TRUE(stalled.Wait());
+        EXPECT_EQ(TransferStatus::Stalled, stalled.status);
+        ASSERT_EQ(Errors::Success, device->ClearHalt(BulkInEndpoint));
+
+        Do(*device, WaitedTransfer(Request::ReadEeprom, AddressAndLength(4096, 64)));
+        EXPECT_EQ(0x01, Do(*device, WaitedTransfer(BulkInEndpoint, WaitedTransfer::Room(2)))[1]);
+        WaitedTransfer late(BulkInEndpoint, WaitedTransfer::Room(64));
+        device->Submit(late);
+        Do(*device, WaitedTransfer(Request::ButtonReport, {}));
+        EXPECT_EQ(0, late.Completions());
+        device->Cancel(late);
+        ASSERT_TRUE(late.Wait());
+        EXPECT_EQ(TransferStatus::Cancelled, late.status);
+        EXPECT_EQ(62U, late.actualLength);
+
+        Do(*device, WaitedTransfer(Request::Reset, {31}));
+        WaitedTransfer gone(Request::Reset, {31});
+        ASSERT_EQ(Errors::Success, device->Submit(gone));
+        ASSERT_TRUE(gone.Wait());
+        EXPECT_EQ(TransferStatus::DeviceGone, gone.status);
+        for (int i = 0; i < 1000 && !Describe(name).usedBy.empty(); ++i) {
+            usleep(1000);
+        }
+    }
+}
+
+TEST_F(UsbIpServerTest, SlowPeerDoesNotHoldUpTheOthers) {
+    const std::string other = ServerThread::UniqueName("b");
+    InstrumentSettings endless;
+    endless.scanBytes = std::uint64_t{1} << 40;
+    server.Add(name, endless);
+    server.Add(other);
+
+    // Asks for a gigabyte and reads none of it.
+    const int lazy = Platform::Usb::ConnectToSimulator(name);
+    ASSERT_GE(lazy, 0);
+    const auto send = [lazy](const auto& bytes) {
+        return ::send(lazy, bytes.data(), bytes.size(), MSG_DONTWAIT | MSG_NOSIGNAL) ==
+               static_cast<ssize_t>(bytes.size());
+    };
+    UsbIp::OperationHeader import;
+    import.operation = UsbIp::Operation::ImportRequest;
+    send(UsbIp::Encode(import));
+    send(UsbIp::EncodeBusId(Platform::Usb::SimulatorBusId));
+    UsbIp::SubmitPacket measure;
+    measure.setup = {Protocol::VendorOut, static_cast<std::uint8_t>(Request::Measure), 0, 0, 0};
+    measure.sequence = 1;
+    send(UsbIp::Encode(measure));
+    UsbIp::SubmitPacket read;
+    read.endpoint = BulkInEndpoint;
+    read.in = true;
+    read.length = 1U << 20;
+    for (read.sequence = 2; read.sequence < 1000 && send(UsbIp::Encode(read)); ++read.sequence) {
+    }
+
+    const auto device = OpenAndClaim(other);
+    for (int i = 0; i < 20; ++i) {
+        Do(*device, WaitedTransfer(Request::Reset, {31}));
+    }
+    close(lazy);
+}
+
+TEST_F(UsbIpServerTest, PeersWithOddMannersDoNoHarm) {
+    const auto instrument = server.Add(name);
+    const auto countFiles = [] {
+        return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
+    };
+    const auto before = countFiles();
+    std::mt19937 random(3);
+    for (int round = 0; round < 200; ++round) {
+        const int file = Platform::Usb::ConnectToSimulator(name);
+        ASSERT_GE(file, 0);
+        Bytes bytes(random() % 400);
+        for (std::uint8_t& byte : bytes) {
+            byte = static_cast<std::uint8_t>(random() % 5);
+        }
+        if (round % 2 == 0) {
+            const UsbIp::OperationHeader header{
+                UsbIp::ProtocolVersion,
+                round % 4 == 0 ? UsbIp::Operation::ImportRequest : UsbIp::Operation::ListRequest,
+                UsbIp::OperationStatus::Ok};
+            const auto start = UsbIp::Encode(header);
+            const auto busId = UsbIp::EncodeBusId(Platform::Usb::SimulatorBusId);
+            bytes.insert(bytes.begin(), busId.begin(), busId.end());
+            bytes.insert(bytes.begin(), start.begin(), start.end());
+        }
+        send(file, bytes.data(), bytes.size(), MSG_NOSIGNAL);
+        close(file);
+    }
+    Platform::ErrorCode code = Errors::Busy;
+    const auto device = Open(name);
+    for (int i = 0; i < 1000 && code == Errors::Busy; ++i) {
+        usleep(1000);
+        code = device->Claim();
+    }
+    EXPECT_EQ(Errors::Success, code);
+    Do(*device, WaitedTransfer(Request::Reset, {31}));
+    device->Release();
+    for (int i = 0; i < 1000 && countFiles() > before; ++i) {
+        usleep(1000);
+    }
+    EXPECT_EQ(before, countFiles());
+}
+
+TEST_F(UsbIpServerTest, TcpOffersAllOfThem) {
+    const std::string other = ServerThread::UniqueName("b");
+    server.Add(name);
+    server.Add(other);
+    std::uint16_t port = 0;
+    server.Do([&] { port = server.Server().ListenTcp(0); });
+    const Platform::Usb::UsbIpConnector connect = [port](Platform::ErrorCode&) {
+        const int file = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+        sockaddr_in address{};
+        address.sin_family = AF_INET;
+        address.sin_port = htons(port);
+        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        EXPECT_EQ(0, ::connect(file, reinterpret_cast<sockaddr*>(&address), sizeof address));
+        return file;
+    };
+    const auto records = Platform::Usb::ListUsbIpDevices(connect);
+    ASSERT_TRUE(records);
+    ASSERT_EQ(2U, records->size());
+    EXPECT_EQ("1-1", (*records)[0].busId);
+    EXPECT_EQ("1-2", (*records)[1].busId);
+    EXPECT_EQ("/simulated/" + other, (*records)[1].path);
+    EXPECT_NE((*records)[0].DeviceId(), (*records)[1].DeviceId());
+
+    const auto overTcp = Platform::Usb::MakeUsbIpDevice(connect, "1-2");
+    EXPECT_EQ(Errors::Success, overTcp->Claim());
+    Do(*overTcp, WaitedTransfer(Request::Reset, {31}));
+    EXPECT_EQ(Errors::Busy, Open(other)->Claim()) << "one import, whichever way it came";
+    EXPECT_EQ(Errors::Success, Open(name)->Claim());
+    EXPECT_EQ(Errors::DeviceNotConnected, Platform::Usb::MakeUsbIpDevice(connect, "1-3")->Claim());
+}
+
+TEST_F(UsbIpServerTest, GivenSocketNeedsNoImport) {
+    const auto instrument = server.Add(name);
+    int files[2] = {-1, -1};
+    ASSERT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, files));
+    server.Do([&] { server.Server().Serve(files[0], name); });
+    EXPECT_EQ(Errors::Busy, Open(name)->Claim());
+    UsbIp::SubmitPacket packet;
+    packet.sequence = 7;
+    packet.in = true;
+    packet.length = 8;
+    packet.setup = {Protocol::VendorIn, static_cast<std::uint8_t>(Request::GetChipId), 0, 0, 8};
+    const UsbIp::PacketBytes bytes = UsbIp::Encode(packet);
+    send(files[1], bytes.data(), bytes.size(), 0);
+    Bytes reply(48 + 8);
+    EXPECT_EQ(static_cast<ssize_t>(reply.size()), recv(files[1], reply.data(), reply.size(), MSG_WAITALL));
+    EXPECT_TRUE(std::ranges::equal(instrument->Settings().chipId, std::span(reply).last(8)));
+    close(files[1]);
+}
+
+TEST_F(UsbIpServerTest, AnotherUsersSimulatorIsSeenAndNotUsed) {
+    if (geteuid() != 0) {
+        GTEST_SKIP() << "needs root to become somebody else";
+    }
+    constexpr uid_t nobody = 65534;
+    int ready[2] = {-1, -1};
+    ASSERT_EQ(0, pipe(ready));
+    const pid_t child = fork();
+    if (child == 0) {
+        const bool listening = setuid(nobody) == 0 && Platform::Usb::ListenAsSimulator(name) >= 0;
+        const char answer = listening ? 'y' : 'n';
+        const bool told = write(ready[1], &answer, 1) == 1;
+        pause();
+        _exit(told ? 0 : 1);
+    }
+    char answer = 'n';
+    ASSERT_EQ(1, read(ready[0], &answer, 1));
+    ASSERT_EQ('y', answer);
+    EXPECT_FALSE(Listed(name));
+    const SimulatorInfo info = Describe(name);
+    EXPECT_FALSE(info.usable);
+    EXPECT_EQ(nobody, info.userId);
+    EXPECT_EQ(child, info.processId);
+    Platform::ErrorCode error = Errors::Success;
+    EXPECT_EQ(nullptr, SimulatorBus().Open("simulated-" + name, error));
+    EXPECT_EQ(Errors::AccessDenied, error);
+    kill(child, SIGKILL);
+    waitpid(child, nullptr, 0);
+    close(ready[0]);
+    close(ready[1]);
+}
+
+}  // namespace
+}  // namespace Varnholt::Simulator
