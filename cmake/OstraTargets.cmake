@@ -50,19 +50,11 @@ function(ostra_program NAME)
   target_link_libraries(${NAME} PRIVATE ${ARG_LINK} ostra_options)
 endfunction()
 
-# Which TestClock.h a test gets: see there.
-if(WIN32 OR OSTRA_SANITIZE MATCHES "thread")
-  set(OSTRA_TEST_TIME RealTime)
-else()
-  set(OSTRA_TEST_TIME VirtualTime)
-endif()
-
 # ostra_test(NAME SOURCES ... [LINK ...]): a GoogleTest program, run by ctest as one test under its name.
 function(ostra_test NAME)
   cmake_parse_arguments(ARG "" "" "SOURCES;LINK" ${ARGN})
   ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest)
-  target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator"
-    "${PROJECT_SOURCE_DIR}/tests/Support/${OSTRA_TEST_TIME}")
+  target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
   add_test(NAME ${NAME} COMMAND ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:${NAME}>)
   set_tests_properties(${NAME} PROPERTIES TIMEOUT 300 SKIP_RETURN_CODE 77)
 endfunction()

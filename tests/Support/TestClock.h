@@ -21,16 +21,24 @@ enum class TestTime { Virtual, RealForThreadSanitizer };
 /// repetition, `--gtest_shuffle --gtest_random_seed=N` repeats one.
 class TestClock final {
   public:
-    explicit TestClock([[maybe_unused]] TestTime time) {
+    explicit TestClock(TestTime time)
+        : TestClock(time, static_cast<std::uint64_t>(testing::UnitTest::GetInstance()->random_seed())) {}
+    /// For a test that tries orders itself: `SeedsToTry` of them, from 1 on.
+    TestClock([[maybe_unused]] TestTime time, [[maybe_unused]] std::uint64_t seed) {
 #if !defined(_WIN32)
 #if defined(__SANITIZE_THREAD__)
         if (time == TestTime::RealForThreadSanitizer) {
             return;
         }
 #endif
-        clock.emplace(static_cast<std::uint64_t>(testing::UnitTest::GetInstance()->random_seed()));
+        clock.emplace(seed);
 #endif
     }
+#if defined(_WIN32) || defined(__SANITIZE_THREAD__)
+    static constexpr std::uint64_t SeedsToTry = 1;  // the system decides the order
+#else
+    static constexpr std::uint64_t SeedsToTry = 500;
+#endif
 
 #if defined(_WIN32)
     bool IsVirtual() const {

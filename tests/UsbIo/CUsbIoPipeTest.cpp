@@ -6,8 +6,7 @@
 #include "Platform/CallFilter.h"
 #include "Protocol/Instrument.h"
 #include "Support/ScriptedUsbIo.h"
-#include "Support/Stopwatch.h"
-#include "TestClock.h"
+#include "Support/TestClock.h"
 #include "UsbIo/CUsbIoPipe.h"
 #include "UsbIo/ScopedDeviceList.h"
 
@@ -32,7 +31,7 @@ class CUsbIoPipeTest : public testing::Test {
         driver.TakeTranscript();
     }
 
-    Tests::TestClock clock;
+    Tests::TestClock clock{Tests::TestTime::RealForThreadSanitizer};
     ScriptedUsbIo driver;
     Platform::ScopedDeviceFiles files{driver};
     CUsbIoPipe pipe;
@@ -102,9 +101,9 @@ TEST_F(CUsbIoPipeTest, ATimedOutReadReturnsOnlyWhenItsBufferIsFree) {
                   {.data = {7, 7}, .after = Never, .cancelledAfter = 60, .cancelledWithData = true});
     std::vector<std::uint8_t> buffer(2);
     std::uint32_t size = 2;
-    const Tests::Stopwatch stopwatch;
+    const Tests::Stopwatch stopwatch(clock);
     EXPECT_EQ(pipe.ReadSync(buffer.data(), size, 100), Status::TimedOut);
-    EXPECT_GE(stopwatch.Milliseconds(), 150U);
+    stopwatch.ExpectBetween(160, 161);
     EXPECT_THAT(buffer, Each(7));
 }
 
@@ -194,8 +193,8 @@ TEST_F(CUsbIoPipeTest, TransfersOfOnePipeOverlap) {
 TEST(CUsbIoPipeRace, NoByteIsLostOrCountedTwiceWhenATimeOutMeetsACompletion) {
     std::uint32_t timedOut = 0;
     std::uint32_t rounds = 0;
-    for (std::uint64_t seed = 1; seed <= Tests::TestClock::Seeds; ++seed) {
-        const Tests::TestClock clock(seed);
+    for (std::uint64_t seed = 1; seed <= Tests::TestClock::SeedsToTry; ++seed) {
+        const Tests::TestClock clock(Tests::TestTime::RealForThreadSanitizer, seed);
         ScriptedUsbIo driver;
         const Platform::ScopedDeviceFiles files(driver);
         CUsbIoPipe pipe;

@@ -7,7 +7,7 @@
 #include "Platform/CallFilter.h"
 #include "Platform/Threads.h"
 #include "Support/ScriptedUsbIo.h"
-#include "TestClock.h"
+#include "Support/TestClock.h"
 #include "UsbIo/CUsbIo.h"
 #include "UsbIo/ScopedDeviceList.h"
 
@@ -61,7 +61,7 @@ class CUsbIoTest : public testing::Test {
         return device.Open(number, list.Get(), &InterfaceClass);
     }
 
-    Tests::TestClock clock;
+    Tests::TestClock clock{Tests::TestTime::RealForThreadSanitizer};
     ScriptedUsbIo driver{{"usbio/1", "usbio/2"}};
     Platform::ScopedDeviceFiles files{driver};
 };

@@ -9,8 +9,7 @@
 
 #include "Protocol/Instrument.h"
 #include "Support/ScriptedUsbIo.h"
-#include "Support/Stopwatch.h"
-#include "TestClock.h"
+#include "Support/TestClock.h"
 #include "UsbIo/CUsbIoReader.h"
 #include "UsbIo/CUsbIoWriter.h"
 #include "UsbIo/ScopedDeviceList.h"
@@ -107,7 +106,7 @@ class CUsbIoThreadTest : public testing::Test {
         driver.TakeTranscript();
     }
 
-    Tests::TestClock clock;
+    Tests::TestClock clock{Tests::TestTime::RealForThreadSanitizer};
     ScriptedUsbIo driver;
     Platform::ScopedDeviceFiles files{driver};
 };
@@ -143,9 +142,9 @@ TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
         Platform::SleepMilliseconds(1);
     }
     reader.onCompleted = {};
-    const Tests::Stopwatch stopwatch;
+    const Tests::Stopwatch stopwatch(clock);
     EXPECT_TRUE(reader.ShutdownThread());
-    EXPECT_LT(stopwatch.Milliseconds(), 500U);
+    stopwatch.ExpectAtMost(0);
     EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
     EXPECT_EQ(reader.FreeBufferCount(), 4U);
     EXPECT_TRUE(reader.ShutdownThread());
@@ -253,8 +252,8 @@ TEST_F(CUsbIoThreadTest, AWriterThatIsFinishedAtOnceSendsNothing) {
 }
 
 TEST(CUsbIoThreadRace, AThreadThatEndedByItselfCanBeStartedAgain) {
-    for (std::uint64_t seed = 1; seed <= Tests::TestClock::Seeds; ++seed) {
-        const Tests::TestClock clock(seed);
+    for (std::uint64_t seed = 1; seed <= Tests::TestClock::SeedsToTry; ++seed) {
+        const Tests::TestClock clock(Tests::TestTime::RealForThreadSanitizer, seed);
         Reader reader;  // without buffers there is nothing to read
         ASSERT_TRUE(reader.StartThread());
         ASSERT_TRUE(reader.WaitForExit());

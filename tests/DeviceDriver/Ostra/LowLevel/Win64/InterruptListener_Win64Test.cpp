@@ -8,7 +8,6 @@
 #include "Platform/CallFilter.h"
 #include "Platform/Threads.h"
 #include "Protocol/Instrument.h"
-#include "Support/Stopwatch.h"
 #include "UsbIoTransportFixture.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
@@ -79,13 +78,13 @@ class InterruptListener_Win64Test : public testing::Test {
         }
     }
     /// Milliseconds.
-    static std::uint64_t TimeOfStop(InterruptListener_Win64& stopped) {
-        const Tests::Stopwatch stopwatch;
+    std::uint64_t TimeOfStop(InterruptListener_Win64& stopped) const {
+        const Tests::Stopwatch stopwatch(clock);
         stopped.Stop();
         return stopwatch.Milliseconds();
     }
 
-    Tests::TestClock clock;
+    Tests::TestClock clock{Tests::TestTime::RealForThreadSanitizer};
     Tests::ScriptedUsbIo driver;
     Platform::ScopedDeviceFiles files{driver};
     Receiver receiver;
@@ -246,8 +245,8 @@ TEST_F(InterruptListener_Win64Test, SaysWhenTheThreadCannotBeMade) {
 TEST(InterruptListener_Win64Race, NoInterruptIsLostOrCountedTwice) {
     // Interrupts about the time when a read is given up, bytes that a cancelled read has moved all the same,
     // and a stop in the middle of it.
-    for (std::uint64_t seed = 1; seed <= Tests::TestClock::Seeds; ++seed) {
-        const Tests::TestClock clock(seed);
+    for (std::uint64_t seed = 1; seed <= Tests::TestClock::SeedsToTry; ++seed) {
+        const Tests::TestClock clock(Tests::TestTime::RealForThreadSanitizer, seed);
         Tests::ScriptedUsbIo driver;
         const Platform::ScopedDeviceFiles files(driver);
         const SmartPointer<CUsbIoPipe> pipe(new CUsbIoPipe);

@@ -8,7 +8,6 @@
 #include "Platform/ScopedThreadPriority.h"
 #include "Platform/Time.h"
 #include "Protocol/Instrument.h"
-#include "Support/Stopwatch.h"
 #include "UsbIoTransportFixture.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
@@ -128,15 +127,14 @@ TEST_F(UsbIoScanTest, OpenEndedScansGrow) {
         sent = 0;
         Send(std::vector<std::uint32_t>(total / Whole, Whole), 0);
         Send({total % Whole}, 1);
-        const Tests::Stopwatch stopwatch;
+        const Tests::Stopwatch stopwatch(clock);
         instrument->StartScan(256, 1, 0);
         EXPECT_LT(stopwatch.Milliseconds(), 300U) << "a scan does not wait for its beep";
         EXPECT_EQ(TakeAll(*instrument, 100000), Stream(0, total)) << total;
         EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
         // Each scan beeps once, and the beep comes by itself.
         ASSERT_EQ(Platform::Wait(beeped.Get(), 10000), Platform::WaitResult::Signalled);
-        EXPECT_GE(stopwatch.Milliseconds(), 370U);
-        EXPECT_LE(stopwatch.Milliseconds(), 600U);
+        stopwatch.ExpectBetween(370, 372);
         const std::lock_guard held(beepLock);
         EXPECT_EQ(beeps, (std::vector<std::pair<std::uint32_t, std::uint32_t>>{{2140, 75}})) << total;
         beeps.clear();
@@ -199,11 +197,11 @@ TEST_F(UsbIoScanTest, FailedScansLeaveNothing) {
         Send({Whole}, 1);
         driver.Script(BulkInEndpoint, row.answer);
         const int priority = Platform::CurrentThreadPriority();
-        const Tests::Stopwatch stopwatch;
+        const Tests::Stopwatch stopwatch(clock);
         EXPECT_EQ(TextOf<IOException>([&] { instrument->StartScan(256, 1, 3 * Whole); }), row.text)
             << row.name;
-        EXPECT_GE(stopwatch.Milliseconds(), row.waits) << row.name;
-        EXPECT_LE(stopwatch.Milliseconds(), row.waits + 200) << row.name;
+        SCOPED_TRACE(row.name);
+        stopwatch.ExpectBetween(row.waits, row.waits + 40);
         EXPECT_EQ(Platform::CurrentThreadPriority(), priority);
         EXPECT_EQ(driver.Running(BulkInEndpoint), 0U) << row.name;
         EXPECT_EQ(TakeAll(*instrument, 256), Bytes()) << row.name;

@@ -9,7 +9,6 @@
 #include "DeviceDriver/Ostra/USB/Win64/USBBrowserImpl_Win64.h"
 #include "Platform/CallFilter.h"
 #include "Protocol/Instrument.h"
-#include "Support/Stopwatch.h"
 #include "UsbIoTransportFixture.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
@@ -112,11 +111,11 @@ TEST_F(PellandoFunctionality_Win64Test, CommandsOnTheWire) {
     const auto instrument = Open();
     for (const Case& row : cases) {
         driver.Script(BulkInEndpoint, {.data = {1, 2, 3, 4}});
-        const Tests::Stopwatch stopwatch;
+        const Tests::Stopwatch stopwatch(clock);
         row.command(*instrument);
         EXPECT_THAT(TakeTransfers(), ElementsAreArray(row.expected)) << row.name;
         if (!row.expected.empty()) {
-            EXPECT_GE(stopwatch.Milliseconds(), 1U) << "the pause before a request";
+            stopwatch.ExpectBetween(1, 2);  // the pause before a request
         }
     }
 }
@@ -180,12 +179,12 @@ TEST_F(PellandoFunctionality_Win64Test, ReadsWaitTheirTimeAnd5SecondsMore) {
     const auto instrument = Open();
     for (const Case& row : cases) {
         std::array<std::uint8_t, 64> buffer;
-        const Tests::Stopwatch stopwatch;
+        const Tests::Stopwatch stopwatch(clock);
         EXPECT_EQ(TextOf<IOException>([&] { row.command(*instrument, buffer.data()); }),
                   "Error in UsbIo function: \"ReadSync\" Error: Error code 0xE000100C: The request has been "
                   "timed out.");
-        EXPECT_GE(stopwatch.Milliseconds(), row.limit) << row.name;
-        EXPECT_LE(stopwatch.Milliseconds(), row.limit + 100) << row.name;
+        SCOPED_TRACE(row.name);
+        stopwatch.Expect(row.limit + 1);  // and the pause before a request
         EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
     }
 }

@@ -10,7 +10,7 @@
 #include "DeviceDriver/Ostra/LowLevel/Win64/PellandoFunctionality_Win64.h"
 #include "Platform/HostQueries.h"
 #include "Support/ScriptedUsbIo.h"
-#include "TestClock.h"
+#include "Support/TestClock.h"
 
 namespace Varnholt::Tests {
 
@@ -26,10 +26,7 @@ class UsbIoTransportFixture : public testing::Test {
     /// What was sent since the last call, without the interrupt listener's reads.
     std::vector<std::string> TakeTransfers();
 
-  private:
-    TestClock clock;  // before all that has to do with time
-
-  protected:
+    TestClock clock{TestTime::RealForThreadSanitizer};  // before all that has to do with time
     ScriptedUsbIo driver;
 
   private:
