@@ -1,5 +1,6 @@
 #include "DeviceDriver/Ostra/LowLevel/Win32/InterruptListener.h"
 
+#include <atomic>
 #include <thread>
 #include <utility>
 #include <vector>
@@ -80,6 +81,7 @@ class InterruptListener::Watch final {
         if (state == State::Running) {
             state = State::StopRequested;
         }
+        endRequested = true;
         Platform::SignalEvent(wake.Get());
     }
     void ClosePipe() {
@@ -112,6 +114,7 @@ class InterruptListener::Watch final {
     const Platform::OwnedHandle started{Platform::MakeAutoResetEvent()};
     const Platform::OwnedHandle wake{Platform::MakeAutoResetEvent()};
     const std::string devicePath;
+    std::atomic<bool> endRequested = false;
     // Guarded by `lock`:
     State state = State::Ended;
     bool touched = false;
@@ -131,14 +134,9 @@ void InterruptListener::Watch::Listen() {
     ExchangePipe(connection);
     Platform::SignalEvent(started.Get());
     Platform::SleepMilliseconds(0);
-    // Asked before each read, because the start of a read resets the wake event and a request with it. A
-    // request that comes in between is repeated by `Stop`.
-    while (GetState() == State::Running) {
-        const std::uint32_t count = connection->Read(buffer);
+    for (std::uint32_t count = 1; count != 0 && !endRequested;) {
+        count = connection->Read(buffer, endRequested);
         DispatchEvent(count);
-        if (count == 0) {
-            break;
-        }
     }
 }
 

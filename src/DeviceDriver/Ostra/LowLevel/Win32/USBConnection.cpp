@@ -106,13 +106,15 @@ void USBConnection::Write(const void* buffer, std::uint32_t length, std::uint32_
 }
 TRACED
 
-std::uint32_t USBConnection::Read(std::vector<std::uint8_t>& buffer) try {
+std::uint32_t USBConnection::Read(std::vector<std::uint8_t>& buffer,
+                                  const std::atomic<bool>& endRequested) try {
     OverlappedRequest request(CompletionEvent());
     request.StartRead(pipeHandle, buffer.data(), static_cast<std::uint32_t>(buffer.size()));
     if (!request.IsRunning()) {
         return 0;  // nothing would ever end the wait: not only when the access was denied
     }
-    if (Platform::Wait(request.CompletionEvent(), Platform::Infinite) != WaitResult::Signalled) {
+    if (!endRequested &&
+        Platform::Wait(request.CompletionEvent(), Platform::Infinite) != WaitResult::Signalled) {
         throw IOException("wait failed", Here());
     }
     std::uint32_t transferred = 0;

@@ -45,7 +45,10 @@ class USBConnection final {
     /// Reads at most the vector's size, waiting without limit; gives the bytes read. 0 when the read could
     /// not be started or gave nothing, also because someone else signalled the event. `IOException` when the
     /// wait fails.
-    std::uint32_t Read(std::vector<std::uint8_t>& buffer);
+    ///
+    /// The start of a read resets the event. Who signals it to end the read, whether that has started or not,
+    /// sets `endRequested` before.
+    std::uint32_t Read(std::vector<std::uint8_t>& buffer, const std::atomic<bool>& endRequested);
 
     /// What a caller needs that keeps several requests outstanding on the pipe.
     Platform::Handle PipeHandle() const noexcept { return pipeHandle; }

@@ -15,6 +15,7 @@ using testing::IsEmpty;
 constexpr std::uint32_t Button = 20011;
 constexpr std::uint32_t Gone = 20010;
 constexpr std::uint32_t InterruptPipe = 3;
+const Answer ButtonData{.data = {1}};
 const std::string InterruptPath = "native/1\\PIPE03";
 
 class NativeInterruptListener : public NativeTest {
@@ -92,6 +93,21 @@ TEST_F(NativeInterruptListener, EndsWithAReceiverThatThrows) {
 
 TEST_F(NativeInterruptListener, WithoutThreadHasNothingToStop) {
     StopWithin(0);
+}
+
+/// Wherever its thread is just then: before, in or after the start of a read.
+TEST_F(NativeInterruptListener, StopsAtOnce) {
+    for (int round = 0; round < 100; ++round) {
+        InterruptListener other("native/1");
+        driver.Script(InterruptPipe, ButtonData);
+        driver.Script(InterruptPipe, {.after = Never});
+        other.Start();
+        const Stopwatch watch(clock);
+        other.Stop();
+        watch.ExpectAtMost(1);
+        EXPECT_EQ(driver.OpenFiles(), 0u);
+        driver.DropScript(InterruptPipe);
+    }
 }
 
 TEST_F(NativeInterruptListener, StopsFromInsideAMessage) {

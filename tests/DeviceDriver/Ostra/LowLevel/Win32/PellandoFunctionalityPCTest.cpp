@@ -14,9 +14,6 @@ using testing::ElementsAre;
 using testing::IsEmpty;
 using Lines = std::vector<std::string>;
 
-/// Comes whenever that thread is ready.
-const std::string ListenersRead = "read 3 [8]";
-
 class NativeCommands : public NativeTest {
   protected:
     void SetUp() override {
@@ -26,159 +23,127 @@ class NativeCommands : public NativeTest {
     PellandoFunctionality_PC instrument{nullptr, 0};
 };
 
+using Instrument = PellandoFunctionality_PC;
+
 struct Command {
     const char* name;
-    std::vector<Answer> controlAnswers;
-    std::vector<Answer> readAnswers;
-    std::function<void(PellandoFunctionality_PC&)> run;
     Lines transcript;
+    Bytes answer;                           ///< of the instrument, in the data stage or as bulk data
+    std::function<Bytes(Instrument&)> run;  ///< gives what the command handed out, in the order of the wire
+};
+
+const Bytes2 P1{0x01, 0x2C}, P2{0x03, 0x04}, P3{0x05, 0x06};
+const Bytes4 Address{0x00, 0x00, 0x10, 0x00};
+const Bytes Image = Counting(3, 0x31);
+
+const Command Commands[] = {
+    {"SetMeasureParameters",
+     {"control 22000D 00 02 00 00 C1 00 00 00 00 00 / 01 2C 03 04 05 06 07 00"},
+     {},
+     [](Instrument& i) { return i.SetMeasureParameters(P1, P2, P3, 7), Bytes(); }},
+    {"GetMeasureParameters",
+     {"control 22000D 01 02 00 00 C2 00 00 00 00 00 / [8]"},
+     Counting(8, 0xA1),
+     [](Instrument& i) {
+         Bytes2 p1, p2, p3;
+         std::uint8_t p4, p5;
+         i.GetMeasureParameters(p1, p2, p3, p4, p5);
+         return Bytes{p1[0], p1[1], p2[0], p2[1], p3[0], p3[1], p4, p5};
+     }},
+    {"SetMeasureMode",
+     {"control 22000D 00 02 00 00 CF 00 00 00 00 00 / 42"},
+     {},
+     [](Instrument& i) { return i.SetMeasureMode(0x42), Bytes(); }},
+    {"GetMeasureMode",
+     {"control 22000D 01 02 00 00 D1 00 00 00 00 00 / [6]"},
+     Counting(6, 0x51),
+     [](Instrument& i) {
+         Bytes m(6);
+         i.GetMeasureMode(m[0], m[1], m[2], m[3], m[4], m[5]);
+         return m;
+     }},
+    {"MeasureRequest",
+     {"control 22000D 00 02 00 00 C0 00 00 00 00 00 / ", "read 1 [4]"},
+     Counting(4, 0x61),
+     [](Instrument& i) {
+         Bytes buffer(4);
+         i.MeasureRequest(buffer.data(), 4, 1);
+         return buffer;
+     }},
+    {"WriteEEPROM",
+     {"control 22000D 00 02 00 00 C3 00 00 00 00 00 / 00 00 10 00 00 03 00 00", "write 2 31 32 33",
+      "write 2 00", "write 2 00"},
+     {},
+     [](Instrument& i) {
+         return i.WriteEEPROM(Address, {0, 3}, Image.data(), 3), Bytes();
+     }},
+    {"ReadEEPROM",
+     {"control 22000D 00 02 00 00 C4 00 00 00 00 00 / 00 00 10 00 00 40 00 00", "read 1 [64]"},
+     Counting(64),
+     [](Instrument& i) {
+         Bytes data(64);
+         i.ReadEEPROM(Address, {0, 64}, data.data(), 64);
+         return data;
+     }},
+    {"WriteCPLD",
+     {"control 22000D 00 02 00 00 C7 00 00 00 00 00 / 01 2C 03 04 05 06"},
+     {},
+     [](Instrument& i) { return i.WriteCPLD(P1, P2, P3), Bytes(); }},
+    {"ReadCPLD",
+     {"control 22000D 01 02 00 00 C8 00 00 00 00 00 / [2]"},
+     {0x12, 0x34},
+     [](Instrument& i) {
+         Bytes2 value;
+         i.ReadCPLD(value);
+         return Bytes(value.begin(), value.end());
+     }},
+    {"DownloadRAMFirmware",
+     {"control 22000D 00 02 00 00 A0 00 34 12 00 00 / 31 32 33"},
+     {},
+     [](Instrument& i) { return i.DownloadRAMFirmware(0x1234, Image.data(), 3), Bytes(); }},
+    {"DownloadEEPROMFirmware",
+     {"control 22000D 00 02 00 00 CB 00 00 00 00 00 / 00 00 10 00 00 03 00 00", "write 2 31 32 33",
+      "write 2 00", "write 2 00"},
+     {},
+     [](Instrument& i) {
+         return i.DownloadEEPROMFirmware(Address, {0, 3}, Image.data(), 3), Bytes();
+     }},
+    {"GetMISC",
+     {"control 22000D 01 02 00 00 C9 00 00 00 00 00 / [8]"},
+     Counting(8, 0xB1),
+     [](Instrument& i) {
+         Bytes2 m2, m4, m5;
+         std::uint8_t m1, m3;
+         i.GetMISC(m1, m2, m3, m4, m5);
+         return Bytes{m2[0], m2[1], m4[0], m4[1], m5[0], m5[1], m1, m3};
+     }},
+    {"GetChipID",
+     {"control 22000D 01 02 00 00 D2 00 00 00 00 00 / [8]"},
+     Counting(8, 0xC1),
+     [](Instrument& i) {
+         Bytes id(8);
+         i.GetChipID(id.data());
+         return id;
+     }},
+    {"Reset",
+     {"control 22000D 00 02 00 00 CA 00 00 00 00 00 / 1F"},
+     {},
+     [](Instrument& i) {
+         return i.Reset({0x00, 0x1F}), Bytes();
+     }},
 };
 
 TEST_F(NativeTest, EachCommandOnTheWire) {
-    const Bytes2 p1{0x01, 0x2C}, p2{0x03, 0x04}, p3{0x05, 0x06};
-    const Bytes4 address{0x00, 0x00, 0x10, 0x00};
-    const Bytes image = Counting(3, 0x31);
-    const Command commands[] = {
-        {"SetMeasureParameters",
-         {},
-         {},
-         [&](auto& i) { i.SetMeasureParameters(p1, p2, p3, 7); },
-         {"control 22000D 00 02 00 00 C1 00 00 00 00 00 / 01 2C 03 04 05 06 07 00"}},
-        {"GetMeasureParameters",
-         {{.data = Counting(8, 0xA1)}},
-         {},
-         [](auto& i) {
-             Bytes2 q1{}, q2{}, q3{};
-             std::uint8_t q4 = 0, q5 = 0;
-             i.GetMeasureParameters(q1, q2, q3, q4, q5);
-             EXPECT_THAT(q1, ElementsAre(0xA1, 0xA2));
-             EXPECT_THAT(q2, ElementsAre(0xA3, 0xA4));
-             EXPECT_THAT(q3, ElementsAre(0xA5, 0xA6));
-             EXPECT_EQ(q4, 0xA7);
-             EXPECT_EQ(q5, 0xA8);
-         },
-         {"control 22000D 01 02 00 00 C2 00 00 00 00 00 / [8]"}},
-        {"SetMeasureMode",
-         {},
-         {},
-         [](auto& i) { i.SetMeasureMode(0x42); },
-         {"control 22000D 00 02 00 00 CF 00 00 00 00 00 / 42"}},
-        {"GetMeasureMode",
-         {{.data = Counting(6, 0x51)}},
-         {},
-         [](auto& i) {
-             Bytes m(6);
-             i.GetMeasureMode(m[0], m[1], m[2], m[3], m[4], m[5]);
-             EXPECT_EQ(m, Counting(6, 0x51));
-         },
-         {"control 22000D 01 02 00 00 D1 00 00 00 00 00 / [6]"}},
-        {"MeasureRequest",
-         {},
-         {{.data = Counting(4, 0x61)}},
-         [](auto& i) {
-             Bytes buffer(4);
-             i.MeasureRequest(buffer.data(), 4, 1);
-             EXPECT_EQ(buffer, Counting(4, 0x61));
-         },
-         {"control 22000D 00 02 00 00 C0 00 00 00 00 00 / ", "read 1 [4]"}},
-        {"WriteEEPROM",
-         {},
-         {},
-         [&](PellandoFunctionality_PC& i) {
-             i.WriteEEPROM(address, {0, 3}, image.data(), 3);
-         },
-         {"control 22000D 00 02 00 00 C3 00 00 00 00 00 / 00 00 10 00 00 03 00 00", "write 2 31 32 33",
-          "write 2 00", "write 2 00"}},
-        {"ReadEEPROM",
-         {},
-         {{.data = Counting(64, 1)}},
-         [&](auto& i) {
-             Bytes data(64);
-             i.ReadEEPROM(address, {0, 64}, data.data(), 64);
-             EXPECT_EQ(data, Counting(64, 1));
-         },
-         {"control 22000D 00 02 00 00 C4 00 00 00 00 00 / 00 00 10 00 00 40 00 00", "read 1 [64]"}},
-        {"WriteCPLD",
-         {},
-         {},
-         [&](auto& i) { i.WriteCPLD(p1, p2, p3); },
-         {"control 22000D 00 02 00 00 C7 00 00 00 00 00 / 01 2C 03 04 05 06"}},
-        {"ReadCPLD",
-         {{.data = {0x12, 0x34}}},
-         {},
-         [](auto& i) {
-             Bytes2 value{};
-             i.ReadCPLD(value);
-             EXPECT_THAT(value, ElementsAre(0x12, 0x34));
-         },
-         {"control 22000D 01 02 00 00 C8 00 00 00 00 00 / [2]"}},
-        {"DownloadRAMFirmware",
-         {},
-         {},
-         [&](auto& i) { i.DownloadRAMFirmware(0x1234, image.data(), 3); },
-         {"control 22000D 00 02 00 00 A0 00 34 12 00 00 / 31 32 33"}},
-        {"DownloadEEPROMFirmware",
-         {},
-         {},
-         [&](auto& i) {
-             i.DownloadEEPROMFirmware(address, {0, 3}, image.data(), 3);
-         },
-         {"control 22000D 00 02 00 00 CB 00 00 00 00 00 / 00 00 10 00 00 03 00 00", "write 2 31 32 33",
-          "write 2 00", "write 2 00"}},
-        {"GetMISC",
-         {{.data = Counting(8, 0xB1)}},
-         {},
-         [](auto& i) {
-             std::uint8_t m1 = 0, m3 = 0;
-             Bytes2 m2{}, m4{}, m5{};
-             i.GetMISC(m1, m2, m3, m4, m5);
-             EXPECT_THAT(m2, ElementsAre(0xB1, 0xB2));
-             EXPECT_THAT(m4, ElementsAre(0xB3, 0xB4));
-             EXPECT_THAT(m5, ElementsAre(0xB5, 0xB6));
-             EXPECT_EQ(m1, 0xB7);
-             EXPECT_EQ(m3, 0xB8);
-         },
-         {"control 22000D 01 02 00 00 C9 00 00 00 00 00 / [8]"}},
-        {"GetChipID",
-         {{.data = Counting(8, 0xC1)}},
-         {},
-         [](auto& i) {
-             Bytes id(8);
-             i.GetChipID(id.data());
-             EXPECT_EQ(id, Counting(8, 0xC1));
-         },
-         {"control 22000D 01 02 00 00 D2 00 00 00 00 00 / [8]"}},
-        {"Reset",
-         {},
-         {},
-         [](auto& i) {
-             i.Reset({0x00, 0x1F});
-         },
-         {"control 22000D 00 02 00 00 CA 00 00 00 00 00 / 1F"}},
-        {"GetDeviceIdentifier",
-         {},
-         {},
-         [](auto& i) {
-             std::string identifier = "before";
-             i.GetDeviceIdentifier(identifier);
-             EXPECT_EQ(identifier, "native/1");
-         },
-         {}},
-    };
-    for (const Command& command : commands) {
+    for (const Command& command : Commands) {
         SCOPED_TRACE(command.name);
-        PellandoFunctionality_PC instrument(nullptr, 0);
-        driver.TakeTranscript();
-        for (const Answer& answer : command.controlAnswers) {
-            driver.Script(0, answer);
-        }
-        for (const Answer& answer : command.readAnswers) {
-            driver.Script(1, answer);
-        }
-        command.run(instrument);
-        Lines transfers = driver.TakeTransfers();
-        std::erase(transfers, ListenersRead);
-        EXPECT_EQ(transfers, command.transcript);
+        Instrument instrument(nullptr, 0);
+        WaitUntil([this] { return IsListening(); });
+        driver.TakeTransfers();
+        const bool isBulk = command.transcript.size() == 2;
+        driver.Script(isBulk ? 1 : 0, {.data = command.answer});
+        EXPECT_EQ(command.run(instrument), command.answer);
+        EXPECT_EQ(driver.TakeTransfers(), command.transcript);
+        driver.DropScript(0);
     }
 }
 

@@ -41,6 +41,11 @@ void ScriptedDriver::Script(std::uint32_t pipe, Answer answer) {
     scripts[pipe].push_back(std::move(answer));
 }
 
+void ScriptedDriver::DropScript(std::uint32_t pipe) {
+    const std::lock_guard held(lock);
+    scripts[pipe].clear();
+}
+
 void ScriptedDriver::RefuseOpen(const std::string& path, ErrorCode code) {
     const std::lock_guard held(lock);
     refusals[path] = code;

@@ -54,6 +54,7 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     ~ScriptedDriver() override;
 
     void Script(std::uint32_t pipe, Answer answer);
+    void DropScript(std::uint32_t pipe);
     void RefuseOpen(const std::string& path, Platform::ErrorCode code);
     /// Called by every opener of the path, who waits for its end.
     void BeforeOpen(const std::string& path, std::function<void()> action);

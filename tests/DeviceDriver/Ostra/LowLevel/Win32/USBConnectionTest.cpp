@@ -283,16 +283,17 @@ TEST_F(UsbConnection, ClosesOnceAndFailsAfterwards) {
     ExpectThrow<IOException>("write data failed" + suffix, [&] { Write64(own); });
     ExpectThrow<TimeoutException>("Device IO control failed " + suffix, [&] { SendControl(own); });
     std::vector<std::uint8_t> buffer(8);
-    EXPECT_EQ(own.Read(buffer), 0u);
+    EXPECT_EQ(own.Read(buffer, false), 0u);
 }
 
 class UsbConnectionVectorRead : public NativeTest {
   protected:
     std::uint32_t Read(Answer answer) {
         driver.Script(3, std::move(answer));
-        return connection.Read(buffer);
+        return connection.Read(buffer, endRequested);
     }
 
+    std::atomic<bool> endRequested = false;
     OwnedHandle event{MakeAutoResetEvent()};
     USBConnection connection{"native/1", 3, event.Get()};
     std::vector<std::uint8_t> buffer = Bytes(8);
@@ -319,6 +320,13 @@ TEST_F(UsbConnectionVectorRead, EndsWhenSomebodySignalsItsEvent) {
               2u)
         << "data that arrive during the cancellation count";
     EXPECT_THAT(driver.TakeTransfers(), ElementsAre("read 3 [8]", "cancel 3", "read 3 [8]", "cancel 3"));
+}
+
+TEST_F(UsbConnectionVectorRead, EndsWhenThatWasRequestedBeforeItStarted) {
+    endRequested = true;
+    SignalEvent(event.Get());
+    EXPECT_EQ(Read({.after = Never}), 0u);
+    EXPECT_EQ(driver.RunningTransfers(), 0u);
 }
 
 TEST_F(UsbConnectionVectorRead, FailsWhenTheWaitDoes) {
