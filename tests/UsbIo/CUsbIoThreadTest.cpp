@@ -234,9 +234,9 @@ TEST_F(CUsbIoThreadTest, WritesUntilFinished) {
     ASSERT_TRUE(writer.AllocateBuffers(2, 3));
     ASSERT_TRUE(writer.StartThread());
     EXPECT_TRUE(writer.WaitForExit());
-    EXPECT_TRUE(writer.ShutdownThread());
     EXPECT_THAT(driver.TakeTranscript(),
                 ElementsAre("write 03 01", "write 03 02", "write 03 03", "write 03 04"));
+    EXPECT_TRUE(writer.ShutdownThread());
     EXPECT_EQ(writer.completed, 0);
     EXPECT_EQ(driver.Running(BulkOutEndpoint), 0U);
 }
@@ -247,8 +247,8 @@ TEST_F(CUsbIoThreadTest, AWriterThatIsFinishedAtOnceSendsNothing) {
     ASSERT_TRUE(writer.AllocateBuffers(2, 3));
     ASSERT_TRUE(writer.StartThread());
     EXPECT_TRUE(writer.WaitForExit());
-    EXPECT_TRUE(writer.ShutdownThread());
     EXPECT_THAT(driver.TakeTranscript(), IsEmpty());
+    EXPECT_TRUE(writer.ShutdownThread());
 }
 
 TEST(CUsbIoThreadRace, AThreadThatEndedByItselfCanBeStartedAgain) {
