@@ -5,7 +5,10 @@
 namespace Varnholt::Platform {
 
 /// Names a waitable object, a thread or an open device file. A handle that names nothing is refused with
-/// `Errors::InvalidHandle`, whatever its value; it is never dereferenced by callers.
+/// `Errors::InvalidHandle`, whatever its value; it is never dereferenced by callers. Whoever hands out
+/// handles keeps to its own values, so that the handle of one is never taken for that of another: the
+/// system's on Windows are 0 modulo 4, waitable objects and threads on other platforms 1, files of `Drivers`
+/// 2; 3 is `InvalidHandle`.
 using Handle = void*;
 inline constexpr Handle NoHandle = nullptr;
 

@@ -7,6 +7,7 @@
 
 #include "Platform/Threads.h"
 #include "Platform/WaitableObjects.h"
+#include "Printing.h"
 
 namespace Varnholt::Platform {
 

@@ -2,26 +2,44 @@
 
 #include <array>
 #include <atomic>
+#include <deque>
 #include <vector>
 
+#include "EachClock.h"
 #include "Platform/CallFilter.h"
 #include "Platform/Time.h"
 #include "Platform/WaitableObjects.h"
 #include "TestThread.h"
+#include "UniqueName.h"
 
 namespace Varnholt::Platform {
-
-void PrintTo(WaitResult result, std::ostream* stream) {
-    *stream << "wait result " << static_cast<std::uint32_t>(result);
-}
-
 namespace {
+
+/// Long enough for threads that said what they do next to have done it.
+constexpr std::uint32_t SettlingTime = 40;
 
 std::uint32_t MillisecondsSince(std::uint32_t start) {
     return TickCount() - start;
 }
 
-TEST(Events, SatisfyOneWaitPerSignal) {
+std::string NameFor(const char* purpose) {
+    return UniqueName(std::string("{") + purpose + "}#");
+}
+
+using Events = EachClock;
+using Waits = EachClock;
+using Mutexes = EachClock;
+using Semaphores = EachClock;
+using SignalAndWaits = EachClock;
+using CriticalSections = EachClock;
+INSTANTIATE_FOR_EACH_CLOCK(Events);
+INSTANTIATE_FOR_EACH_CLOCK(Waits);
+INSTANTIATE_FOR_EACH_CLOCK(Mutexes);
+INSTANTIATE_FOR_EACH_CLOCK(Semaphores);
+INSTANTIATE_FOR_EACH_CLOCK(SignalAndWaits);
+INSTANTIATE_FOR_EACH_CLOCK(CriticalSections);
+
+TEST_P(Events, KeepOneSignalForOneWait) {
     const OwnedHandle event(MakeAutoResetEvent());
     EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
     EXPECT_TRUE(SignalEvent(event.Get()));
@@ -30,59 +48,129 @@ TEST(Events, SatisfyOneWaitPerSignal) {
     EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
 }
 
-TEST(Events, SignalsInARowEndAsManyWaits) {
+TEST_P(Events, SignalsInARowEndAsManyWaits) {
     constexpr int Threads = 4;
     const OwnedHandle event(MakeAutoResetEvent());
-    const OwnedHandle ready(MakeSemaphore(0, Threads, ""));
     std::atomic<int> ended = 0;
-    const auto body = [&] {
-        ReleaseSemaphore(ready.Get(), 1);
-        EXPECT_EQ(Wait(event.Get(), LongTimeout), WaitResult::Signalled);
-        ++ended;
-    };
-    TestThread threads[Threads]{TestThread(body), TestThread(body), TestThread(body), TestThread(body)};
+    std::deque<TestThread> threads;
     for (int i = 0; i < Threads; ++i) {
-        ASSERT_EQ(Wait(ready.Get(), LongTimeout), WaitResult::Signalled);
+        threads.emplace_back([&] {
+            EXPECT_EQ(Wait(event.Get(), LongTimeout), WaitResult::Signalled);
+            ++ended;
+        });
     }
-    SleepMilliseconds(50);  // between saying so and waiting lies nothing else
+    SleepMilliseconds(SettlingTime);
     for (int i = 0; i < Threads; ++i) {
-        SignalEvent(event.Get());
+        EXPECT_TRUE(SignalEvent(event.Get()));
     }
-    for (TestThread& thread : threads) {
-        thread.Join();
-    }
+    threads.clear();
     EXPECT_EQ(ended, Threads);
     EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
 }
 
-TEST(Waits, LastAsLongAsTheirTimeout) {
+TEST_P(Waits, LastAsLongAsTheirTimeout) {
     const OwnedHandle event(MakeAutoResetEvent());
     const std::uint32_t start = TickCount();
     EXPECT_EQ(Wait(event.Get(), 60), WaitResult::TimedOut);
-    EXPECT_GE(MillisecondsSince(start), 59u);
+    EXPECT_EQ(WaitAny(std::array{event.Get()}, 40).result, WaitResult::TimedOut);
+    EXPECT_GE(MillisecondsSince(start), 90u);  // a tick may be 10 ms long
     EXPECT_LT(MillisecondsSince(start), 5000u);
 }
 
-TEST(Waits, RefuseWhatIsNoHandle) {
+TEST_P(Waits, RefuseWhatIsNoHandle) {
     OwnedHandle closed(MakeAutoResetEvent());
+    const OwnedHandle event(MakeAutoResetEvent());
     const Handle gone = closed.Get();
     closed.Reset();
-    int local = 0;
-    for (const Handle handle : {NoHandle, InvalidHandle(), static_cast<Handle>(&local), gone}) {
-        SetLastError(0);
-        EXPECT_EQ(Wait(handle, 0), WaitResult::Failed);
-        EXPECT_EQ(LastError(), Errors::InvalidHandle);
-        EXPECT_FALSE(SignalEvent(handle));
-        EXPECT_FALSE(ReleaseMutex(handle));
-        EXPECT_FALSE(ReleaseSemaphore(handle, 1));
+    for (const Handle handle : {NoHandle, InvalidHandle(), gone}) {
+        const auto refused = [](bool isFailure) {
+            EXPECT_TRUE(isFailure);
+            EXPECT_EQ(LastError(), Errors::InvalidHandle);
+            SetLastError(Errors::Success);
+        };
+        refused(Wait(handle, 0) == WaitResult::Failed);
+        refused(WaitAny(std::array{event.Get(), handle}, 0).result == WaitResult::Failed);
+        refused(SignalAndWait(event.Get(), handle, 0) == WaitResult::Failed);
+        refused(SignalAndWait(handle, event.Get(), 0) == WaitResult::Failed);
+        refused(!SignalEvent(handle));
+        refused(!ReleaseMutex(handle));
+        refused(!ReleaseSemaphore(handle, 1));
     }
-    SetLastError(0);
-    EXPECT_FALSE(Close(gone));
-    EXPECT_EQ(LastError(), Errors::InvalidHandle);
 }
 
-TEST(Mutexes, AreRecursiveAndBelongToAThread) {
-    for (const std::string name : {"", "ostra-test-mutex"}) {
+TEST_P(Waits, RefuseAnotherKindOfObject) {
+    const OwnedHandle event(MakeAutoResetEvent());
+    const OwnedHandle mutex(MakeMutex(""));
+    EXPECT_FALSE(SignalEvent(mutex.Get()));
+    EXPECT_EQ(LastError(), Errors::InvalidHandle);
+    EXPECT_FALSE(ReleaseMutex(event.Get()));
+    EXPECT_EQ(LastError(), Errors::InvalidHandle);
+    EXPECT_FALSE(ReleaseSemaphore(event.Get(), 1));
+    EXPECT_EQ(LastError(), Errors::InvalidHandle);
+    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
+}
+
+TEST_P(Waits, TakeOnlyTheFirstObjectThatCanBeTaken) {
+    const OwnedHandle event(MakeAutoResetEvent());
+    const OwnedHandle semaphore(MakeSemaphore(1, 1, ""));
+    const OwnedHandle mutex(MakeMutex(""));
+    const std::array objects{event.Get(), semaphore.Get(), mutex.Get()};
+    for (const std::size_t expected : {std::size_t{1}, std::size_t{2}}) {
+        const WaitAnyResult outcome = WaitAny(objects, 0);
+        EXPECT_EQ(outcome.result, WaitResult::Signalled);
+        EXPECT_EQ(outcome.index, expected);
+    }
+    SignalEvent(event.Get());
+    ReleaseSemaphore(semaphore.Get(), 1);
+    EXPECT_EQ(WaitAny(objects, 0).index, 0u);
+    EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
+}
+
+TEST_P(Waits, EndWithWhicheverObjectComesFirst) {
+    const OwnedHandle first(MakeAutoResetEvent());
+    const OwnedHandle second(MakeAutoResetEvent());
+    WaitAnyResult outcome{};
+    TestThread waiting([&] { outcome = WaitAny(std::array{first.Get(), second.Get()}, LongTimeout); });
+    SleepMilliseconds(SettlingTime);
+    SignalEvent(second.Get());
+    SignalEvent(first.Get());
+    waiting.Join();
+    EXPECT_EQ(outcome.result, WaitResult::Signalled);
+    EXPECT_EQ(outcome.index, 1u);
+    EXPECT_EQ(Wait(first.Get(), 0), WaitResult::Signalled) << "a wait that had ended took another signal";
+}
+
+TEST_P(Waits, AreForOneToSixtyFourObjects) {
+    const OwnedHandle semaphore(MakeSemaphore(1, 1, ""));
+    std::vector<OwnedHandle> events;
+    std::vector<Handle> objects;
+    for (int i = 0; i < 63; ++i) {
+        objects.push_back(events.emplace_back(MakeAutoResetEvent()).Get());
+    }
+    objects.push_back(semaphore.Get());
+    EXPECT_EQ(WaitAny(objects, 0).index, 63u);
+    objects.push_back(events.emplace_back(MakeAutoResetEvent()).Get());
+    for (const auto& refused : {std::vector<Handle>{}, objects}) {
+        SetLastError(Errors::Success);
+        EXPECT_EQ(WaitAny(refused, 0).result, WaitResult::Failed);
+        EXPECT_EQ(LastError(), Errors::InvalidParameter);
+    }
+}
+
+TEST_P(Waits, GoOnWhenTheirHandleIsClosed) {
+    OwnedHandle event(MakeAutoResetEvent());
+    const OwnedHandle other(MakeAutoResetEvent());
+    TestThread waiting([handle = event.Get(), &other] {
+        EXPECT_EQ(WaitAny(std::array{handle, other.Get()}, LongTimeout).result, WaitResult::Signalled);
+    });
+    SleepMilliseconds(SettlingTime);
+    event.Reset();
+    SleepMilliseconds(1);
+    SignalEvent(other.Get());
+}
+
+TEST_P(Mutexes, AreRecursiveAndBelongToAThread) {
+    for (const std::string& name : {std::string(), NameFor("recursion")}) {
         const OwnedHandle mutex(MakeMutex(name));
         EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
         EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
@@ -99,6 +187,253 @@ TEST(Mutexes, AreRecursiveAndBelongToAThread) {
         }).Join();
         EXPECT_FALSE(ReleaseMutex(mutex.Get()));
         EXPECT_EQ(LastError(), Errors::NotOwner);
+    }
+}
+
+TEST_P(Mutexes, AreOneForTheSameName) {
+    const OwnedHandle first(MakeMutex(NameFor("same")));
+    const OwnedHandle second(MakeMutex(NameFor("same")));
+    const OwnedHandle other(MakeMutex(NameFor("other")));
+    const OwnedHandle otherCase(MakeMutex(NameFor("Same")));
+    EXPECT_EQ(Wait(first.Get(), 0), WaitResult::Signalled);
+    TestThread([&] {
+        EXPECT_EQ(Wait(second.Get(), 0), WaitResult::TimedOut);
+        EXPECT_EQ(Wait(other.Get(), 0), WaitResult::Signalled);
+        EXPECT_TRUE(ReleaseMutex(other.Get()));
+        EXPECT_EQ(Wait(otherCase.Get(), 0), WaitResult::Signalled);
+        EXPECT_TRUE(ReleaseMutex(otherCase.Get()));
+    }).Join();
+    EXPECT_TRUE(ReleaseMutex(second.Get())) << "two handles of one thread are one mutex";
+}
+
+TEST_P(Mutexes, TellTheNextOwnerWhenTheLastOneEnded) {
+    for (const std::string& name : {std::string(), NameFor("abandoned")}) {
+        const OwnedHandle mutex(MakeMutex(name));
+        const OwnedHandle never(MakeAutoResetEvent());
+        TestThread([&] { Wait(mutex.Get(), 0); }).Join();
+        const WaitAnyResult outcome = WaitAny(std::array{never.Get(), mutex.Get()}, LongTimeout);
+        EXPECT_EQ(outcome.result, WaitResult::Abandoned);
+        EXPECT_EQ(outcome.index, 1u);
+        EXPECT_TRUE(ReleaseMutex(mutex.Get())) << "an abandoned mutex has been acquired";
+        EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled) << "it is told once";
+        EXPECT_TRUE(ReleaseMutex(mutex.Get()));
+    }
+}
+
+TEST_P(Mutexes, AreHandedOnWhenTheirOwnerEnds) {
+    for (const std::string& name : {std::string(), NameFor("handed on")}) {
+        const OwnedHandle mutex(MakeMutex(name));
+        const OwnedHandle owned(MakeAutoResetEvent());
+        TestThread owner([&] {
+            Wait(mutex.Get(), 0);
+            Wait(mutex.Get(), 0);
+            SignalEvent(owned.Get());
+            SleepMilliseconds(SettlingTime);
+        });
+        EXPECT_EQ(Wait(owned.Get(), LongTimeout), WaitResult::Signalled);
+        EXPECT_EQ(Wait(mutex.Get(), LongTimeout), WaitResult::Abandoned);
+        EXPECT_TRUE(ReleaseMutex(mutex.Get()));
+    }
+}
+
+TEST_P(Mutexes, ExcludeThreads) {
+    for (const std::string& name : {std::string(), NameFor("exclusion")}) {
+        const OwnedHandle mutex(MakeMutex(name));
+        int counter = 0;
+        const auto count = [&] {
+            for (int i = 0; i < 300; ++i) {
+                EXPECT_EQ(Wait(mutex.Get(), LongTimeout), WaitResult::Signalled);
+                const int before = counter;
+                if (i % 16 == 0) {
+                    SleepMilliseconds(0);
+                }
+                counter = before + 1;
+                EXPECT_TRUE(ReleaseMutex(mutex.Get()));
+            }
+        };
+        {
+            TestThread first(count);
+            TestThread second(count);
+            TestThread third(count);
+        }
+        EXPECT_EQ(counter, 900);
+    }
+}
+
+TEST_P(Semaphores, CountUpToTheirMaximum) {
+    for (const std::string& name : {std::string(), NameFor("semaphore")}) {
+        const OwnedHandle semaphore(MakeSemaphore(1, 3, name));
+        EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
+        EXPECT_EQ(Wait(semaphore.Get(), 10), WaitResult::TimedOut);
+        EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 2));
+        for (const std::int32_t tooMany : {2, 0x7FFFFFFF}) {
+            SetLastError(Errors::Success);
+            EXPECT_FALSE(ReleaseSemaphore(semaphore.Get(), tooMany));
+            EXPECT_EQ(LastError(), Errors::TooManyPosts);
+        }
+        for (const std::int32_t nothing : {0, -1}) {
+            SetLastError(Errors::Success);
+            EXPECT_FALSE(ReleaseSemaphore(semaphore.Get(), nothing));
+            EXPECT_EQ(LastError(), Errors::InvalidParameter);
+        }
+        EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
+        EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
+        EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::TimedOut);
+    }
+}
+
+TEST_P(Semaphores, LetAsManyThreadsPassAsAreReleased) {
+    constexpr std::int32_t Threads = 3;
+    const OwnedHandle semaphore(MakeSemaphore(0, 0x7FFFFFFF, ""));
+    std::atomic<int> passed = 0;
+    std::deque<TestThread> threads;
+    for (int i = 0; i < Threads; ++i) {
+        threads.emplace_back([&] {
+            EXPECT_EQ(Wait(semaphore.Get(), LongTimeout), WaitResult::Signalled);
+            ++passed;
+        });
+    }
+    SleepMilliseconds(SettlingTime);
+    EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), Threads - 1));
+    SleepMilliseconds(SettlingTime);
+    EXPECT_EQ(passed, Threads - 1);
+    EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 1));
+    threads.clear();
+    EXPECT_EQ(passed, Threads);
+}
+
+TEST_P(Semaphores, RefuseImpossibleCounts) {
+    struct {
+        std::int32_t initial;
+        std::int32_t maximum;
+    } const cases[] = {{-1, 1}, {0, 0}, {0, -1}, {2, 1}};
+    for (const auto& counts : cases) {
+        SetLastError(Errors::Success);
+        EXPECT_EQ(MakeSemaphore(counts.initial, counts.maximum, ""), NoHandle)
+            << counts.initial << " of " << counts.maximum;
+        EXPECT_EQ(LastError(), Errors::InvalidParameter);
+    }
+}
+
+TEST_P(SignalAndWaits, ReleaseAMutexForTheirWait) {
+    for (const std::string& name : {std::string(), NameFor("released")}) {
+        const OwnedHandle mutex(MakeMutex(name));
+        const OwnedHandle semaphore(MakeSemaphore(0, 1, ""));
+        EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
+        TestThread other([&] {
+            EXPECT_EQ(Wait(mutex.Get(), LongTimeout), WaitResult::Signalled);
+            EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 1));
+            EXPECT_TRUE(ReleaseMutex(mutex.Get()));
+        });
+        EXPECT_EQ(SignalAndWait(mutex.Get(), semaphore.Get(), LongTimeout), WaitResult::Signalled);
+        EXPECT_FALSE(ReleaseMutex(mutex.Get()));
+        EXPECT_EQ(LastError(), Errors::NotOwner);
+    }
+}
+
+TEST_P(SignalAndWaits, WaitForNothingWhenTheyCannotSignal) {
+    const OwnedHandle event(MakeAutoResetEvent());
+    const OwnedHandle mutex(MakeMutex(""));
+    const OwnedHandle full(MakeSemaphore(1, 1, ""));
+    TestThread thread([] {});
+    SignalEvent(event.Get());
+    struct {
+        Handle toSignal;
+        ErrorCode code;
+    } const cases[] = {{mutex.Get(), Errors::NotOwner},
+                       {full.Get(), Errors::TooManyPosts},
+                       {thread.Get(), Errors::InvalidHandle}};
+    for (const auto& failing : cases) {
+        SetLastError(Errors::Success);
+        EXPECT_EQ(SignalAndWait(failing.toSignal, event.Get(), LongTimeout), WaitResult::Failed);
+        EXPECT_EQ(LastError(), failing.code);
+    }
+    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::Signalled) << "the wait took the signal all the same";
+}
+
+/// Two threads that pass a turn to and fro would stand still if a signal came between signalling and waiting.
+TEST_P(SignalAndWaits, LoseNoSignal) {
+    const OwnedHandle first(MakeAutoResetEvent());
+    const OwnedHandle second(MakeAutoResetEvent());
+    constexpr int Turns = 500;
+    TestThread other([&] {
+        EXPECT_EQ(Wait(second.Get(), LongTimeout), WaitResult::Signalled);
+        for (int i = 0; i < Turns; ++i) {
+            ASSERT_EQ(SignalAndWait(first.Get(), second.Get(), LongTimeout), WaitResult::Signalled);
+        }
+    });
+    for (int i = 0; i < Turns; ++i) {
+        ASSERT_EQ(SignalAndWait(second.Get(), first.Get(), LongTimeout), WaitResult::Signalled);
+    }
+    SignalEvent(second.Get());
+}
+
+TEST_P(CriticalSections, AreRecursiveAndExclude) {
+    CriticalSection section;
+    int counter = 0;
+    const auto count = [&] {
+        for (int i = 0; i < 300; ++i) {
+            const CriticalSection::Holder outer(section);
+            const CriticalSection::Holder inner(section);
+            const int before = counter;
+            if (i % 16 == 0) {
+                SleepMilliseconds(0);
+            }
+            counter = before + 1;
+        }
+    };
+    {
+        TestThread first(count);
+        TestThread second(count);
+        TestThread third(count);
+    }
+    EXPECT_EQ(counter, 900);
+}
+
+TEST_P(CriticalSections, HoldOthersUpUntilTheLastLeave) {
+    CriticalSection section;
+    std::atomic<bool> entered = false;
+    section.Enter();
+    section.Enter();
+    TestThread other([&] {
+        const CriticalSection::Holder holder(section);
+        entered = true;
+    });
+    section.Leave();
+    SleepMilliseconds(SettlingTime);
+    EXPECT_FALSE(entered);
+    section.Leave();
+    other.Join();
+    EXPECT_TRUE(entered);
+}
+
+TEST(CallFilters, MakeCallsFailWithoutTouchingTheSystem) {
+    const OwnedHandle event(MakeAutoResetEvent());
+    const OwnedHandle mutex(MakeMutex(""));
+    const OwnedHandle semaphore(MakeSemaphore(1, 2, ""));
+    Wait(mutex.Get(), 0);
+    SignalEvent(event.Get());
+    struct {
+        std::string_view name;
+        std::function<bool()> succeeds;
+    } const calls[] = {
+        {"MakeAutoResetEvent", [&] { return static_cast<bool>(OwnedHandle(MakeAutoResetEvent())); }},
+        {"MakeMutex", [&] { return static_cast<bool>(OwnedHandle(MakeMutex(""))); }},
+        {"MakeSemaphore", [&] { return static_cast<bool>(OwnedHandle(MakeSemaphore(0, 1, ""))); }},
+        {"SignalEvent", [&] { return SignalEvent(event.Get()); }},
+        {"ReleaseMutex", [&] { return ReleaseMutex(mutex.Get()); }},
+        {"ReleaseSemaphore", [&] { return ReleaseSemaphore(semaphore.Get(), 1); }},
+        {"Wait", [&] { return Wait(event.Get(), 0) == WaitResult::Signalled; }},
+        {"WaitAny", [&] { return WaitAny(std::array{semaphore.Get()}, 0).result == WaitResult::Signalled; }},
+        {"SignalAndWait",
+         [&] { return SignalAndWait(event.Get(), semaphore.Get(), 0) == WaitResult::Signalled; }},
+    };
+    for (const auto& call : calls) {
+        InstallCallFilter([&](std::string_view name) { return name == call.name ? 1450u : 0u; });
+        EXPECT_FALSE(call.succeeds()) << call.name;
+        EXPECT_EQ(LastError(), 1450u) << call.name;
+        InstallCallFilter({});
+        EXPECT_TRUE(call.succeeds()) << call.name;
     }
 }
 

@@ -11,6 +11,7 @@ namespace Varnholt::Platform::Posix {
 
 class BlockedCall;
 class ThreadRecord;
+class WaitableObject;
 
 /// Microseconds of the clock in force; a clock's origin is its own.
 using Microseconds = std::uint64_t;
@@ -37,9 +38,11 @@ class Clock {
     virtual void Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) = 0;
     /// Lets the blocked call return.
     virtual void Wake(BlockedCall& call) = 0;
-    /// Makes the caller, whose call another process must end, look again after `period`.
+    /// As `Block` where another process may have to do something. The caller looks again afterwards, because
+    /// this returns in any case: after `period` unless `only` is set, the one object that is waited for,
+    /// whose changes are `seen`.
     virtual void BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
-                                     Microseconds period) = 0;
+                                     Microseconds period, WaitableObject* only, std::uint32_t seen) = 0;
 
     /// A platform call begins or has woken somebody: another thread may go first.
     virtual void Preempt(KernelHold& hold) = 0;

@@ -12,15 +12,21 @@ WaitableObject::Taken MutexObject::TryTake(ThreadRecord& taker) {
     if (owner) {
         return Taken::No;
     }
-    const Taken fromOthers = TakeFromOthers();
-    if (fromOthers == Taken::No) {
-        return Taken::No;
+    const Taken taken = TakeFree();
+    if (taken != Taken::No) {
+        taker.owned.push_back(shared_from_this());
+        owner = &taker;
+        depth = 1;
     }
-    taker.owned.push_back(shared_from_this());
-    owner = &taker;
-    depth = 1;
-    const bool wasAbandoned = std::exchange(abandoned, false) || fromOthers == Taken::Abandoned;
+    return taken;
+}
+
+WaitableObject::Taken MutexObject::TakeFree() {
     return wasAbandoned ? Taken::Abandoned : Taken::Yes;
+}
+
+void MutexObject::LetGo(bool isAbandoned) {
+    wasAbandoned = isAbandoned;
 }
 
 ErrorCode MutexObject::Release(ThreadRecord& releaser) {
@@ -32,7 +38,7 @@ ErrorCode MutexObject::Release(ThreadRecord& releaser) {
     }
     std::erase_if(releaser.owned, [this](const auto& owned) { return owned.get() == this; });
     owner = nullptr;
-    GiveToOthers(false);
+    LetGo(false);
     OfferToWaiters();
     return Errors::Success;
 }
@@ -40,8 +46,7 @@ ErrorCode MutexObject::Release(ThreadRecord& releaser) {
 void MutexObject::Abandon() {
     owner = nullptr;
     depth = 0;
-    abandoned = true;
-    GiveToOthers(true);
+    LetGo(true);
     OfferToWaiters();
 }
 

@@ -23,13 +23,14 @@ class MutexObject : public WaitableObject, public std::enable_shared_from_this<M
     bool IsOwnedHere() const { return owner != nullptr; }
 
   private:
-    /// Between processes: called on the thread that takes or has taken the mutex in this process.
-    virtual Taken TakeFromOthers() { return Taken::Yes; }
-    virtual void GiveToOthers(bool /*wasAbandoned*/) {}
+    /// Where the mutex is kept while no thread of this process owns it: called on the thread that takes it,
+    /// and on the one that lets go of it.
+    virtual Taken TakeFree();
+    virtual void LetGo(bool isAbandoned);
 
     ThreadRecord* owner = nullptr;
     unsigned depth = 0;
-    bool abandoned = false;
+    bool wasAbandoned = false;  ///< by its last owner
 };
 
 }  // namespace Varnholt::Platform::Posix

@@ -8,10 +8,18 @@
 #include "Platform/Posix/Immortal.h"
 #include "Platform/Posix/Kernel.h"
 #include "Platform/Posix/RealScheduler.h"
+#include "Platform/Posix/WaitableObject.h"
 
 namespace Varnholt::Platform::Posix {
 
 using std::chrono::steady_clock;
+
+namespace {
+
+/// The death of a process changes nothing that could be awaited, so that is looked for this often.
+constexpr Microseconds LongestAwait = 50'000;
+
+}  // namespace
 
 RealClock& RealClock::Instance() {
     static Immortal<RealClock> clock;
@@ -49,8 +57,15 @@ void RealClock::Wake(BlockedCall& call) {
 }
 
 void RealClock::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
-                                    Microseconds period) {
-    Block(hold, call, std::min(deadline, Now() + period));
+                                    Microseconds period, WaitableObject* only, std::uint32_t seen) {
+    const Microseconds now = Now();
+    if (only && deadline > now) {
+        hold.unlock();
+        only->AwaitChange(seen, std::min(deadline - now, LongestAwait));
+        hold.lock();
+    } else {
+        Block(hold, call, std::min(deadline, now + period));
+    }
 }
 
 void RealClock::GiveUpSlice(KernelHold& hold) {

@@ -16,8 +16,8 @@ class RealClock final : public Clock {
 
     void Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) override;
     void Wake(BlockedCall& call) override;
-    void BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
-                             Microseconds period) override;
+    void BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline, Microseconds period,
+                             WaitableObject* only, std::uint32_t seen) override;
     void Preempt(KernelHold& /*hold*/) override {}
     void GiveUpSlice(KernelHold& hold) override;
     void ThreadMade(KernelHold& /*hold*/, ThreadRecord& /*thread*/) override {}

@@ -1,9 +1,13 @@
 #include "Platform/Posix/SharedObjects.h"
 
+#include <linux/futex.h>
 #include <pthread.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
 #include <atomic>
 #include <cerrno>
+#include <limits>
 #include <map>
 #include <mutex>
 
@@ -13,12 +17,43 @@
 namespace Varnholt::Platform::Posix {
 namespace {
 
-/// Tells our memory from other content, and from that of a process with another layout of it.
+/// Lets the threads of all processes wait until an object may have become available. A process may die at any
+/// point of it: then a wake-up is tried for nobody, or a sleeper wakes a little later.
+class ChangeCount final {
+  public:
+    std::uint32_t Get() const { return std::atomic_ref(changes).load(); }
+
+    void Increment() {
+        ++std::atomic_ref(changes);
+        if (std::atomic_ref(sleepers).load() != 0) {
+            syscall(SYS_futex, &changes, FUTEX_WAKE, std::numeric_limits<int>::max(), nullptr, nullptr, 0);
+        }
+    }
+
+    void Await(std::uint32_t seen, Microseconds limit) {
+        const timespec timeout{static_cast<time_t>(limit / 1'000'000),
+                               static_cast<long>(limit % 1'000'000 * 1000)};
+        ++std::atomic_ref(sleepers);
+        syscall(SYS_futex, &changes, FUTEX_WAIT, seen, &timeout, nullptr, 0);
+        --std::atomic_ref(sleepers);
+    }
+
+  private:
+    // Only through `std::atomic_ref`.
+    mutable std::uint32_t changes = 0;
+    std::uint32_t sleepers = 0;
+};
+static_assert(std::atomic_ref<std::uint32_t>::is_always_lock_free,
+              "a process that dies must not keep a lock");
+
+/// Begins the content of every file; tells our memory from other content, and from that of a process with
+/// another layout of it.
 template <typename Content>
 struct Header {
     static constexpr std::uint64_t Magic = 0x4F53545241000000u + Content::Version;
     std::uint64_t magic = Magic;
     std::uint64_t size = sizeof(Content);
+    ChangeCount changes;
     bool IsValid() const { return magic == Magic && size == sizeof(Content); }
 };
 
@@ -68,26 +103,30 @@ class SharedMutex final : public MutexObject {
     explicit SharedMutex(std::unique_ptr<SharedFile> opened)
         : file(std::move(opened)), content(*static_cast<MutexContent*>(file->Memory())) {}
 
+    bool CanBeTakenForOthers() const override { return false; }
     bool IsHeldElsewhere() const override { return !IsOwnedHere(); }
-    bool TakenByItsThreadOnly() const override { return true; }
+    std::uint32_t Changes() const override { return content.header.changes.Get(); }
+    void AwaitChange(std::uint32_t seen, Microseconds limit) override {
+        content.header.changes.Await(seen, limit);
+    }
     std::string Describe() const override { return MutexObject::Describe() + " shared between processes"; }
 
   private:
-    Taken TakeFromOthers() override {
+    Taken TakeFree() override {
         const int code = pthread_mutex_trylock(&content.mutex);
         if (code == EOWNERDEAD) {
             pthread_mutex_consistent(&content.mutex);
-            content.abandoned = 0;
             return Taken::Abandoned;
         }
         if (code != 0) {
             return Taken::No;
         }
-        return std::exchange(content.abandoned, 0u) != 0 ? Taken::Abandoned : Taken::Yes;
+        return content.abandoned != 0 ? Taken::Abandoned : Taken::Yes;
     }
-    void GiveToOthers(bool wasAbandoned) override {
-        content.abandoned = wasAbandoned;
+    void LetGo(bool isAbandoned) override {
+        content.abandoned = isAbandoned;
         pthread_mutex_unlock(&content.mutex);
+        content.header.changes.Increment();
     }
 
     const std::unique_ptr<SharedFile> file;
@@ -106,7 +145,6 @@ struct SemaphoreContent {
     }
     bool IsValid() const { return header.IsValid() && maximum > 0; }
 };
-static_assert(std::atomic_ref<std::int32_t>::is_always_lock_free, "a process that dies must not keep a lock");
 
 class SharedSemaphore final : public SemaphoreObject {
   public:
@@ -114,6 +152,10 @@ class SharedSemaphore final : public SemaphoreObject {
         : file(std::move(opened)), content(*static_cast<SemaphoreContent*>(file->Memory())) {}
 
     bool IsHeldElsewhere() const override { return true; }
+    std::uint32_t Changes() const override { return content.header.changes.Get(); }
+    void AwaitChange(std::uint32_t seen, Microseconds limit) override {
+        content.header.changes.Await(seen, limit);
+    }
     Taken TryTake(ThreadRecord& /*taker*/) override {
         const std::atomic_ref available(content.available);
         std::int32_t count = available.load();
@@ -134,6 +176,7 @@ class SharedSemaphore final : public SemaphoreObject {
                 return false;
             }
         } while (!available.compare_exchange_weak(count, count + added));
+        content.header.changes.Increment();
         return true;
     }
 

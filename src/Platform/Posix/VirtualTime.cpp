@@ -139,7 +139,7 @@ void VirtualTime::Wake(BlockedCall& call) {
 
 /// The other process lives in real time: as much of it passes as the wait takes of ours.
 void VirtualTime::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
-                                      Microseconds period) {
+                                      Microseconds period, WaitableObject* /*only*/, std::uint32_t /*seen*/) {
     Block(hold, call, std::min(deadline, now + period));
     if (!call.woken) {
         hold.unlock();

@@ -5,7 +5,7 @@
 namespace Varnholt::Platform::Posix {
 namespace {
 
-/// How often a thread looks for what another process may have released.
+/// How often a thread that waits for several objects looks for what another process may have released.
 constexpr Microseconds FirstLook = 500;
 constexpr Microseconds LongestLook = 4000;
 
@@ -71,11 +71,7 @@ void WaitableObject::OfferToWaiters() {
         if (waiter->IsSatisfied()) {
             continue;
         }
-        if (TakenByItsThreadOnly()) {
-            CurrentClock().Wake(*waiter);
-            return;
-        }
-        if (!waiter->Offer(*this)) {
+        if (CanBeTakenForOthers() && !waiter->Offer(*this)) {
             return;
         }
         CurrentClock().Wake(*waiter);
@@ -85,24 +81,26 @@ void WaitableObject::OfferToWaiters() {
 WaitAnyResult WaitForAny(KernelHold& hold, std::span<const ObjectRef> objects, Microseconds deadline) {
     Waiter waiter(CurrentThread(), objects);
     Clock& clock = CurrentClock();
+    WaitableObject* const only = objects.size() == 1 ? objects[0].get() : nullptr;
     Microseconds period = FirstLook;
-    while (!waiter.IsSatisfied() && !waiter.Take()) {
-        if (clock.Now() >= deadline) {
-            break;
+    while (true) {
+        // Before the look at the object, so that no change comes between the two.
+        const std::uint32_t seen = only ? only->Changes() : 0;
+        waiter.woken = false;
+        if (waiter.IsSatisfied() || waiter.Take() || clock.Now() >= deadline) {
+            return waiter.Outcome();
         }
         if (waiter.NeedsOtherProcess()) {
-            clock.BlockOnOtherProcess(hold, waiter, deadline, period);
+            clock.BlockOnOtherProcess(hold, waiter, deadline, period, only, seen);
             period = std::min(2 * period, LongestLook);
         } else {
             clock.Block(hold, waiter, deadline);
         }
-        waiter.woken = false;  // perhaps to look for itself, in vain
         if (waiter.hopeless) {
             SetLastError(Errors::OperationAborted);
             return {WaitResult::Failed, 0};
         }
     }
-    return waiter.Outcome();
 }
 
 }  // namespace Varnholt::Platform::Posix

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <list>
 #include <memory>
 #include <span>
@@ -31,10 +32,14 @@ class WaitableObject {
     virtual Taken TryTake(ThreadRecord& taker) = 0;
     /// Signals or releases the object by one, for `SignalAndWait`.
     virtual ErrorCode Signal(ThreadRecord& signaller) = 0;
-    /// True when another process may have to make the object available.
+    /// False when `taker` must be the calling thread; who waits is then woken to take the object himself.
+    virtual bool CanBeTakenForOthers() const { return true; }
+    /// True when another process may have to make the object available. `Changes` then counts what may have
+    /// made it so, and `AwaitChange`, without the kernel lock, returns soon after it has passed `seen`, and
+    /// after `limit` at the latest.
     virtual bool IsHeldElsewhere() const { return false; }
-    /// True when only the thread that waits can take it: it is then woken to look for itself.
-    virtual bool TakenByItsThreadOnly() const { return false; }
+    virtual std::uint32_t Changes() const { return 0; }
+    virtual void AwaitChange(std::uint32_t /*seen*/, Microseconds /*limit*/) {}
     /// After a wait of the caller has taken the object, without the kernel lock.
     virtual void AfterWait() {}
     /// The last handle is closed by `closer`.

@@ -1,0 +1,133 @@
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "Platform/CallFilter.h"
+#include "Platform/DeviceFiles.h"
+#include "Platform/DeviceInterfaces.h"
+#include "Protocol/NativeDriver.h"
+#include "Protocol/UsbIoDriver.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+/// Files that are there to be listed.
+class ListedFiles final : public DeviceFileSystem {
+  public:
+    std::vector<std::string> paths;
+
+    std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override {
+        return interfaceClass == Protocol::UsbIoDriver::InterfaceClass ? paths : std::vector<std::string>{};
+    }
+    Handle Open(const std::string&) override { return InvalidHandle(); }
+    bool CloseFile(Handle) override { return false; }
+    bool StartRead(Handle, void*, std::uint32_t, Overlapped&) override { return false; }
+    bool StartWrite(Handle, const void*, std::uint32_t, Overlapped&) override { return false; }
+    bool StartControl(Handle, std::uint32_t, const void*, std::uint32_t, void*, std::uint32_t,
+                      Overlapped&) override {
+        return false;
+    }
+    bool GetResult(Handle, Overlapped&, std::uint32_t&, bool) override { return false; }
+    bool CancelTransfers(Handle) override { return false; }
+};
+
+class Interfaces : public testing::Test {
+  protected:
+    static constexpr auto Class = Protocol::UsbIoDriver::InterfaceClass;
+
+    void SetUp() override {
+        files.paths = {"usbio/first", "", "usbio/third"};
+        list = DeviceInterfaces::MakeList(Class, false);
+        ASSERT_NE(list, nullptr);
+    }
+    void TearDown() override {
+        InstallCallFilter({});
+        EXPECT_TRUE(DeviceInterfaces::DestroyList(list));
+    }
+
+    ListedFiles files;
+    const ScopedDeviceFiles replaced{files};
+    DeviceList list = nullptr;
+};
+
+std::vector<std::byte> Detail(std::size_t size, std::uint32_t sizeField = InterfaceDetailSizeField) {
+    std::vector<std::byte> detail(size, std::byte{0xEE});
+    std::memcpy(detail.data(), &sizeField, std::min(size, sizeof sizeField));
+    return detail;
+}
+
+TEST_F(Interfaces, AreASnapshotInTheOrderOfTheFiles) {
+    const std::vector<std::string> expected = files.paths;
+    files.paths.clear();
+    InterfaceRecord record;
+    std::vector<std::string> found;
+    for (std::uint32_t index = 0; DeviceInterfaces::Find(list, Class, index, record); ++index) {
+        EXPECT_EQ(record.interfaceClass, Class);
+        std::vector<std::byte> detail = Detail(DeviceInterfaces::DetailSize(list, record));
+        ASSERT_TRUE(DeviceInterfaces::ReadDetail(list, record, detail));
+        EXPECT_EQ(detail.back(), std::byte{0});
+        found.emplace_back(reinterpret_cast<const char*>(detail.data() + InterfaceDetailPathOffset));
+        EXPECT_EQ(detail.size(), InterfaceDetailPathOffset + found.back().size() + 1);
+    }
+    EXPECT_EQ(LastError(), Errors::NoMoreItems);
+    EXPECT_EQ(found, expected);
+}
+
+TEST_F(Interfaces, OfAnotherClassAreNotFound) {
+    InterfaceRecord record;
+    EXPECT_FALSE(DeviceInterfaces::Find(list, Protocol::NativeDriver::InterfaceClass, 0, record));
+    EXPECT_EQ(LastError(), Errors::NoMoreItems);
+}
+
+TEST_F(Interfaces, NeedTheSizesThatTheSystemExpects) {
+    InterfaceRecord wrongSize;
+    wrongSize.size = 32;
+    EXPECT_FALSE(DeviceInterfaces::Find(list, Class, 0, wrongSize));
+    EXPECT_EQ(LastError(), Errors::InvalidParameter);
+
+    InterfaceRecord record;
+    ASSERT_TRUE(DeviceInterfaces::Find(list, Class, 0, record));
+    const std::uint32_t size = DeviceInterfaces::DetailSize(list, record);
+    struct {
+        std::vector<std::byte> detail;
+        ErrorCode code;
+    } cases[] = {{Detail(size, 8), Errors::InvalidParameter},
+                 {Detail(size - 1), Errors::InsufficientBuffer},
+                 {Detail(0), Errors::InsufficientBuffer},
+                 {Detail(3), Errors::InsufficientBuffer}};
+    for (auto& failing : cases) {
+        const std::vector<std::byte> before = failing.detail;
+        EXPECT_FALSE(DeviceInterfaces::ReadDetail(list, record, failing.detail));
+        EXPECT_EQ(LastError(), failing.code);
+        EXPECT_EQ(failing.detail, before) << "a failed read must not write";
+    }
+    const InterfaceRecord neverFilled;
+    EXPECT_EQ(DeviceInterfaces::DetailSize(list, neverFilled), 0u);
+}
+
+TEST_F(Interfaces, CanBeMadeToFail) {
+    InterfaceRecord record;
+    ASSERT_TRUE(DeviceInterfaces::Find(list, Class, 0, record));
+    std::vector<std::byte> detail = Detail(DeviceInterfaces::DetailSize(list, record));
+    struct {
+        std::string_view name;
+        std::function<bool()> succeeds;
+    } const calls[] = {
+        {"LoadEnumeration", [] { return DeviceInterfaces::Load(); }},
+        {"LoadEnumeration", [] { return DeviceInterfaces::MakeList(Class, false) != nullptr; }},
+        {"MakeList", [] { return DeviceInterfaces::MakeList(Class, false) != nullptr; }},
+        {"FindInterface", [&] { return DeviceInterfaces::Find(list, Class, 0, record); }},
+        {"DetailSize", [&] { return DeviceInterfaces::DetailSize(list, record) != 0; }},
+        {"ReadDetail", [&] { return DeviceInterfaces::ReadDetail(list, record, detail); }},
+    };
+    for (const auto& call : calls) {
+        InstallCallFilter([&](std::string_view name) { return name == call.name ? 1450u : 0u; });
+        EXPECT_FALSE(call.succeeds()) << call.name;
+        EXPECT_EQ(LastError(), 1450u) << call.name;
+    }
+}
+
+}  // namespace
+}  // namespace Varnholt::Platform

@@ -1,0 +1,126 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "EachClock.h"
+#include "Platform/EventScheduler.h"
+#include "Support/ResourceCount.h"
+#include "TestThread.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+using testing::ElementsAre;
+using TestSupport::ResourceCount;
+
+using Schedulers = EachClock;
+INSTANTIATE_FOR_EACH_CLOCK(Schedulers);
+
+TEST_P(Schedulers, CallEventsInOrderOfTime) {
+    EventScheduler& scheduler = ClockScheduler();
+    const std::uint64_t start = scheduler.Now();
+    const OwnedHandle done(MakeAutoResetEvent());
+    std::vector<std::string> calls;  // events are called one at a time
+    const auto note = [&](const char* text, std::uint64_t due) {
+        EXPECT_GE(scheduler.Now(), start + due);
+        calls.emplace_back(text);
+    };
+    scheduler.CallAt(start + 30'000, [&] {
+        note("last", 30'000);
+        SignalEvent(done.Get());
+    });
+    scheduler.CallAt(start + 10'000, [&] {
+        note("first", 10'000);
+        scheduler.CallAt(0, [&] { note("at once", 10'000); });
+        EXPECT_THAT(calls, ElementsAre("first")) << "called from inside CallAt";
+    });
+    scheduler.CallAt(start + 20'000, [&] { note("second", 20'000); });
+    EXPECT_EQ(Wait(done.Get(), LongTimeout), WaitResult::Signalled);
+    EXPECT_THAT(calls, ElementsAre("first", "at once", "second", "last"));
+}
+
+TEST_P(Schedulers, ForgetEvents) {
+    EventScheduler& scheduler = ClockScheduler();
+    const std::uint64_t start = scheduler.Now();
+    const OwnedHandle done(MakeAutoResetEvent());
+    std::atomic<int> called = 0;
+    const auto held = std::make_shared<int>();
+    const auto forgotten = scheduler.CallAt(start + 10'000, [&called, held] { ++called; });
+    EventScheduler::EventId own = 0;
+    own = scheduler.CallAt(start + 20'000, [&] {
+        scheduler.Forget(own);
+        SignalEvent(done.Get());
+    });
+    EXPECT_NE(forgotten, 0u);
+    EXPECT_NE(forgotten, own);
+    scheduler.Forget(forgotten);
+    EXPECT_EQ(held.use_count(), 1) << "what is forgotten holds nothing any more";
+    EXPECT_EQ(Wait(done.Get(), LongTimeout), WaitResult::Signalled);
+    scheduler.Forget(own);
+    scheduler.Forget(forgotten);
+    EXPECT_EQ(called, 0);
+}
+
+TEST_P(Schedulers, ForgetReturnsAfterACallThatIsRunning) {
+    EventScheduler& scheduler = ClockScheduler();
+    const OwnedHandle running(MakeAutoResetEvent());
+    std::atomic<bool> over = false;
+    const auto id = scheduler.CallAt(scheduler.Now(), [&] {
+        SignalEvent(running.Get());
+        SleepMilliseconds(30);
+        over = true;
+    });
+    TestThread other([&] {
+        EXPECT_EQ(Wait(running.Get(), LongTimeout), WaitResult::Signalled);
+        scheduler.Forget(id);
+        EXPECT_TRUE(over);
+    });
+}
+
+/// Without events there is no thread, however they went.
+TEST_P(Schedulers, LeaveNoThreadBehind) {
+    EventScheduler& scheduler = ClockScheduler();
+    const OwnedHandle done(MakeAutoResetEvent());
+    const ResourceCount before = ResourceCount::Take();
+    for (int i = 0; i < 20; ++i) {
+        scheduler.CallAt(scheduler.Now() + 500, [&] { SignalEvent(done.Get()); });
+        EXPECT_EQ(Wait(done.Get(), LongTimeout), WaitResult::Signalled);
+        EXPECT_TRUE(before.Settles()) << "after a call";
+        scheduler.Forget(scheduler.CallAt(scheduler.Now() + 60'000'000, [] {}));
+        EXPECT_TRUE(before.Settles()) << "after an event was forgotten";
+    }
+}
+
+/// Events from several threads that come and go quickly, so that the scheduler's own thread does as well.
+TEST_P(Schedulers, CallEveryEventOnce) {
+    constexpr int PerThread = 200;
+    EventScheduler& scheduler = ClockScheduler();
+    std::atomic<int> called = 0;
+    std::atomic<int> forgotten = 0;
+    const OwnedHandle all(MakeSemaphore(0, 0x7FFFFFFF, ""));
+    const auto body = [&] {
+        for (int i = 0; i < PerThread; ++i) {
+            scheduler.CallAt(scheduler.Now() + static_cast<std::uint64_t>(i % 3) * 100, [&] {
+                ++called;
+                ReleaseSemaphore(all.Get(), 1);
+            });
+            scheduler.Forget(scheduler.CallAt(scheduler.Now() + 10'000'000, [&] { ++forgotten; }));
+        }
+    };
+    {
+        TestThread first(body);
+        TestThread second(body);
+    }
+    for (int i = 0; i < 2 * PerThread; ++i) {
+        ASSERT_EQ(Wait(all.Get(), LongTimeout), WaitResult::Signalled);
+    }
+    EXPECT_EQ(called, 2 * PerThread);
+    EXPECT_EQ(forgotten, 0);
+}
+
+}  // namespace
+}  // namespace Varnholt::Platform

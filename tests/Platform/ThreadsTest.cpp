@@ -1,0 +1,113 @@
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <vector>
+
+#include "EachClock.h"
+#include "Platform/CallFilter.h"
+#include "Platform/ErrorCodes.h"
+#include "Platform/Threads.h"
+#include "Support/ResourceCount.h"
+#include "TestThread.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+using TestSupport::ResourceCount;
+
+using Threads = EachClock;
+INSTANTIATE_FOR_EACH_CLOCK(Threads);
+
+std::uint32_t SetFlagLater(void* flag) {
+    SleepMilliseconds(20);
+    *static_cast<std::atomic<bool>*>(flag) = true;
+    return 0;
+}
+
+TEST_P(Threads, AreSignalledForGoodOnceTheyEnded) {
+    std::atomic<bool> ran = false;
+    const OwnedHandle thread(StartThread(SetFlagLater, &ran));
+    EXPECT_EQ(Wait(thread.Get(), 0), WaitResult::TimedOut);
+    EXPECT_EQ(Wait(thread.Get(), LongTimeout), WaitResult::Signalled);
+    EXPECT_TRUE(ran);
+    EXPECT_EQ(Wait(thread.Get(), 0), WaitResult::Signalled);
+}
+
+TEST_P(Threads, OfClosedHandlesRunOn) {
+    std::atomic<bool> ran = false;
+    EXPECT_TRUE(Close(StartThread(SetFlagLater, &ran)));
+    for (int i = 0; i < 1000 && !ran; ++i) {
+        SleepMilliseconds(5);
+    }
+    EXPECT_TRUE(ran);
+}
+
+TEST_P(Threads, RememberTheirPriority) {
+    EXPECT_EQ(CurrentThreadPriority(), 0);
+    for (const int level : {HighestThreadPriority, -1, 1, 0}) {
+        EXPECT_TRUE(SetCurrentThreadPriority(level));
+        EXPECT_EQ(CurrentThreadPriority(), level);
+        TestThread([] { EXPECT_EQ(CurrentThreadPriority(), 0) << "a priority is one thread's"; }).Join();
+    }
+    EXPECT_FALSE(SetCurrentThreadPriority(HighestThreadPriority + 1));
+    EXPECT_EQ(LastError(), Errors::InvalidParameter);
+    EXPECT_EQ(CurrentThreadPriority(), 0);
+}
+
+TEST_P(Threads, HaveTheirOwnLastError) {
+    SetLastError(Errors::Busy);
+    TestThread([] {
+        EXPECT_FALSE(SignalEvent(NoHandle));
+        EXPECT_EQ(LastError(), Errors::InvalidHandle);
+    }).Join();
+    SleepMilliseconds(1);
+    EXPECT_EQ(LastError(), Errors::Busy);
+}
+
+/// A caller that forces a thread to its end must be able to rely on the answer.
+TEST_P(Threads, EndByForceOrSayThatTheyCannot) {
+    const OwnedHandle leave(MakeAutoResetEvent());
+    std::atomic<bool> left = false;
+    TestThread thread([&] {
+        Wait(leave.Get(), LongTimeout);
+        left = true;
+    });
+    SleepMilliseconds(20);
+    const bool isEnded = EndThreadByForce(thread.Get(), 0xFFFFFFFF);
+    SignalEvent(leave.Get());
+    thread.Join();
+    EXPECT_NE(left, isEnded);
+    EXPECT_FALSE(EndThreadByForce(NoHandle, 0));
+    EXPECT_EQ(LastError(), Errors::InvalidHandle);
+}
+
+TEST_P(Threads, LeaveNothingBehind) {
+    std::atomic<bool> warmUp = false;
+    Wait(OwnedHandle(StartThread(SetFlagLater, &warmUp)).Get(), LongTimeout);
+    const ResourceCount before = ResourceCount::Take();
+    for (int i = 0; i < 50; ++i) {
+        std::atomic<bool> waitedFor = false;
+        std::atomic<bool> closedAtOnce = false;
+        const OwnedHandle thread(StartThread(SetFlagLater, &waitedFor));
+        Close(StartThread(SetFlagLater, &closedAtOnce));
+        EXPECT_EQ(Wait(thread.Get(), LongTimeout), WaitResult::Signalled);
+        while (!closedAtOnce) {
+            SleepMilliseconds(1);
+        }
+    }
+    EXPECT_TRUE(before.Settles()) << before << " before, " << ResourceCount::Take() << " after";
+}
+
+TEST(ThreadCalls, CanBeMadeToFail) {
+    InstallCallFilter(
+        [](std::string_view name) { return name == "StartThread" ? Errors::NotEnoughMemory : 0; });
+    std::atomic<bool> ran = false;
+    EXPECT_EQ(StartThread(SetFlagLater, &ran), NoHandle);
+    EXPECT_EQ(LastError(), Errors::NotEnoughMemory);
+    InstallCallFilter({});
+    SleepMilliseconds(30);
+    EXPECT_FALSE(ran);
+}
+
+}  // namespace
+}  // namespace Varnholt::Platform

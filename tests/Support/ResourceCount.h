@@ -1,0 +1,24 @@
+#pragma once
+
+#include <cstddef>
+#include <iosfwd>
+
+namespace Varnholt::TestSupport {
+
+/// What this process has taken from the system. Counts that lag behind (a thread that has been joined may
+/// still be listed for a moment) are the reason for `Settles`.
+struct ResourceCount {
+    std::size_t threads = 0;
+    std::size_t files = 0;  ///< descriptors; on Windows all handles
+    std::size_t maps = 0;   ///< mapped files; 0 on Windows
+
+    bool operator==(const ResourceCount&) const = default;
+
+    static ResourceCount Take();
+    /// Waits until the counts are these, for a few seconds at most, and answers whether they are.
+    bool Settles() const;
+};
+
+std::ostream& operator<<(std::ostream& stream, const ResourceCount& count);
+
+}  // namespace Varnholt::TestSupport

@@ -1,0 +1,23 @@
+#include <tlhelp32.h>
+#include <windows.h>
+
+#include "Support/ResourceCount.h"
+
+namespace Varnholt::TestSupport {
+
+ResourceCount ResourceCount::Take() {
+    ResourceCount count;
+    DWORD handles = 0;
+    GetProcessHandleCount(GetCurrentProcess(), &handles);
+    count.files = handles;
+    const HANDLE snapshot = CreateToolhelp32Snapshot(TH32CS_SNAPTHREAD, 0);
+    THREADENTRY32 entry{};
+    entry.dwSize = sizeof entry;
+    for (BOOL found = Thread32First(snapshot, &entry); found; found = Thread32Next(snapshot, &entry)) {
+        count.threads += entry.th32OwnerProcessID == GetCurrentProcessId() ? 1U : 0U;
+    }
+    CloseHandle(snapshot);
+    return count;
+}
+
+}  // namespace Varnholt::TestSupport
