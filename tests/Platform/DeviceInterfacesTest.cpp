@@ -129,5 +129,20 @@ TEST_F(Interfaces, CanBeMadeToFail) {
     }
 }
 
+TEST_F(Interfaces, OfUnknownListsAreRefused) {
+    int local = 0;
+    const DeviceList gone = DeviceInterfaces::MakeList({}, false);
+    EXPECT_TRUE(DeviceInterfaces::DestroyList(gone));
+    for (const DeviceList unknown : {DeviceList{}, static_cast<DeviceList>(&local), gone}) {
+        InterfaceRecord record;
+        SetLastError(Errors::Success);
+        EXPECT_FALSE(DeviceInterfaces::Find(unknown, {}, 0, record));
+        EXPECT_EQ(LastError(), Errors::InvalidHandle);
+        EXPECT_EQ(DeviceInterfaces::DetailSize(unknown, record), 0u);
+        EXPECT_FALSE(DeviceInterfaces::ReadDetail(unknown, record, {}));
+        EXPECT_FALSE(DeviceInterfaces::DestroyList(unknown));
+    }
+}
+
 }  // namespace
 }  // namespace Varnholt::Platform

@@ -6,11 +6,9 @@
 #include <set>
 #include <string>
 
-#include "Platform/DeviceInterfaces.h"
 #include "Platform/ErrorCodes.h"
 #include "Platform/HostQueries.h"
 #include "Platform/Posix/ErrnoCodes.h"
-#include "Platform/Time.h"
 
 namespace Varnholt::Platform {
 namespace {
@@ -98,21 +96,6 @@ TEST(HostAnswers, CanBeReplaced) {
     EXPECT_EQ(Overridden64BitHost(), false);
     Override64BitHost(std::nullopt);
     EXPECT_EQ(Overridden64BitHost(), std::nullopt);
-}
-
-TEST(UnknownLists, AreRefusedByAllOperations) {
-    int local = 0;
-    const DeviceList gone = DeviceInterfaces::MakeList({}, false);
-    EXPECT_TRUE(DeviceInterfaces::DestroyList(gone));
-    for (const DeviceList list : {DeviceList{}, static_cast<DeviceList>(&local), gone}) {
-        InterfaceRecord record;
-        SetLastError(Errors::Success);
-        EXPECT_FALSE(DeviceInterfaces::Find(list, {}, 0, record));
-        EXPECT_EQ(LastError(), Errors::InvalidHandle);
-        EXPECT_EQ(DeviceInterfaces::DetailSize(list, record), 0u);
-        EXPECT_FALSE(DeviceInterfaces::ReadDetail(list, record, {}));
-        EXPECT_FALSE(DeviceInterfaces::DestroyList(list));
-    }
 }
 
 }  // namespace
