@@ -89,7 +89,7 @@ class FaultInjector final : public UsbDevice, private TransferClient {
     ErrorCode Begin(const PassagePointer& passage);
     ErrorCode PassOn(const PassagePointer& passage);
     void ReplaceOutData(Passage& passage);
-    void AnswerWithLastData(const PassagePointer& passage);
+    bool AnswerWithLastData(const PassagePointer& passage);
     void HoldFor(const PassagePointer& passage, std::uint32_t milliseconds);
     void TimeHasCome(const PassagePointer& passage);
     void TransferCompleted(Transfer& transfer) noexcept override;
@@ -215,8 +215,7 @@ ErrorCode FaultInjector::Begin(const PassagePointer& passage) {
             return PassOn(passage);
         case FaultKind::Stale:
             if (passage->IsIn()) {
-                AnswerWithLastData(passage);
-                return Errors::Success;
+                return AnswerWithLastData(passage) ? Errors::Success : PassOn(passage);
             }
             ReplaceOutData(*passage);
             return PassOn(passage);
@@ -292,17 +291,20 @@ void FaultInjector::ReplaceOutData(Passage& passage) {
     passage.data = data.data();
 }
 
-void FaultInjector::AnswerWithLastData(const PassagePointer& passage) {
-    std::uint32_t length = passage->length;
+/// False when there are none to repeat.
+bool FaultInjector::AnswerWithLastData(const PassagePointer& passage) {
+    std::uint32_t length = 0;
     {
         const std::lock_guard lock(mutex);
-        std::fill_n(passage->data, length, std::uint8_t{0});
-        if (const auto last = lastData.find({passage->endpoint, true}); last != lastData.end()) {
-            length = static_cast<std::uint32_t>(std::min<std::size_t>(length, last->second.size()));
-            std::copy_n(last->second.begin(), length, passage->data);
+        const auto last = lastData.find({passage->endpoint, true});
+        if (last == lastData.end()) {
+            return false;
         }
+        length = static_cast<std::uint32_t>(std::min<std::size_t>(passage->length, last->second.size()));
+        std::copy_n(last->second.begin(), length, passage->data);
     }
     End(*passage, TransferStatus::Completed, length);
+    return true;
 }
 
 void FaultInjector::HoldFor(const PassagePointer& passage, std::uint32_t milliseconds) {

@@ -45,6 +45,8 @@ struct Operation {
     /// Opens the instrument, does its work, closes it.
     std::function<Outcome()> run;
     std::uint64_t scanBytes = Protocol::ReadoutBytes;
+    bool endsWithShortTransfer =
+        false;  ///< as an open-ended scan does, so that it cannot tell a fault from its end
 };
 
 /// An operation on an opened instrument; other exceptions than the documented ones end the test.
@@ -101,7 +103,7 @@ std::vector<Operation> Operations() {
         {"GetMISC", OnInstrument([](P& i) { i.GetMISC(byte, word, byte, word, word); })},
         {"Reset", OnInstrument([](P& i) { i.Reset(7); })},
         {"FixedScan", OnInstrument([](P& i) { RunScan(i, ScanTotal); }), ScanTotal},
-        {"OpenScan", OnInstrument([](P& i) { RunScan(i, 0); }), OpenScanTotal},
+        {"OpenScan", OnInstrument([](P& i) { RunScan(i, 0); }), OpenScanTotal, true},
         {"ExportedReadout",
          []() -> Outcome {
              std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
@@ -132,7 +134,8 @@ bool IsDocumented(Transport transport, const std::string& text) {
 }
 
 /// Whether an operation can end well although this fault hit this transfer.
-bool MayGoUnnoticed(Transport transport, const Fault& fault, const RecordedTransfer& undisturbed) {
+bool MayGoUnnoticed(Transport transport, const Fault& fault, const RecordedTransfer& undisturbed,
+                    bool openScan) {
     const bool control = undisturbed.endpoint == 0;
     if (undisturbed.endpoint == Protocol::InterruptInEndpoint ||
         undisturbed.status == TransferStatus::Cancelled) {
@@ -150,7 +153,7 @@ bool MayGoUnnoticed(Transport transport, const Fault& fault, const RecordedTrans
             return true;
         case FaultKind::Short:
         case FaultKind::Empty:
-            return control || transport == Transport::UsbIo || undisturbed.length == 0;
+            return control || transport == Transport::UsbIo || undisturbed.length == 0 || openScan;
         case FaultKind::Long:
             return undisturbed.length == 0;
         default:
@@ -195,7 +198,8 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
         if (outcome) {
             EXPECT_TRUE(IsDocumented(transport, *outcome)) << *outcome;
         } else if (script->Hits() > 0 && script->Transfers() > fault.index) {
-            EXPECT_TRUE(MayGoUnnoticed(transport, fault, undisturbed)) << "passed all the same";
+            EXPECT_TRUE(MayGoUnnoticed(transport, fault, undisturbed, operation.endsWithShortTransfer))
+                << "passed all the same";
         }
         EXPECT_EQ(instrument.PendingTransfers(), 0U);
         EXPECT_FALSE(instrument.Claimed());
@@ -223,6 +227,11 @@ std::optional<std::uint32_t> ArgumentOf(FaultKind kind) {
     }
 }
 
+/// An instrument that never stops streaming makes an open-ended scan last for ever, as it should.
+bool NeverEnds(const Operation& operation, const Fault& fault) {
+    return operation.endsWithShortTransfer && fault.fromThenOn && fault.kind == FaultKind::Stale;
+}
+
 TEST_P(FaultSweep, EveryFaultAtEveryTransfer) {
     const std::vector<RecordedTransfer> undisturbed = Undisturbed();
     // The pieces of a whole image are alike: the first and last ones stand for all, and samples between.
@@ -236,6 +245,9 @@ TEST_P(FaultSweep, EveryFaultAtEveryTransfer) {
                 fault.fromThenOn = fromThenOn;
                 fault.kind = name.kind;
                 fault.argument = ArgumentOf(name.kind);
+                if (NeverEnds(operation, fault)) {
+                    continue;
+                }
                 RunWith(FaultPlan({fault}), undisturbed[index]);
                 ++cases;
                 if (HasFailure()) {
