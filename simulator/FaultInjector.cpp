@@ -25,6 +25,10 @@ namespace {
 
 using Bytes = std::vector<std::uint8_t>;
 
+/// Milliseconds: no host asks an interrupt endpoint more often, so that no fault can make it answer without a
+/// pause.
+constexpr std::uint32_t InterruptInterval = 1;
+
 void FillWithGarbage(std::uint8_t* data, std::size_t length, std::uint32_t seed) {
     std::uint32_t state = seed * 2654435761U + 1;
     for (std::size_t i = 0; i < length; ++i) {
@@ -52,7 +56,8 @@ struct Passage : Transfer {
     std::optional<Fault> fault;
     State state = State::Held;
     bool cancelWanted = false;
-    Bytes replacedData;  // of an OUT transfer whose data are changed
+    bool polled = false;  // an interrupt transfer that was held until its endpoint was polled
+    Bytes replacedData;   // of an OUT transfer whose data are changed
 
     bool Has(FaultKind kind) const { return fault && fault->kind == kind; }
 };
@@ -186,6 +191,11 @@ ErrorCode FaultInjector::Begin(const PassagePointer& passage) {
         return PassOn(passage);
     }
     const std::optional<std::uint32_t> argument = passage->fault->argument;
+    if (ScopeOfEndpoint(passage->endpoint) == FaultScope::Interrupt && !passage->Has(FaultKind::Late) &&
+        !std::exchange(passage->polled, true)) {
+        HoldFor(passage, InterruptInterval);
+        return Errors::Success;
+    }
     switch (passage->fault->kind) {
         case FaultKind::Stall:
             End(*passage, TransferStatus::Stalled, 0);
@@ -248,6 +258,10 @@ ErrorCode FaultInjector::PassOn(const PassagePointer& passage) {
     constexpr std::uint8_t clearFeature = 1;
     {
         const std::lock_guard lock(mutex);
+        const auto found = passages.find(passage->original);
+        if (found == passages.end() || found->second != passage) {
+            return Errors::Success;  // cancelled while it was held
+        }
         passage->state = Passage::State::Submitting;
         if (keepsData && !passage->IsIn()) {
             lastData[{passage->endpoint, false}].assign(passage->data, passage->data + passage->length);
@@ -323,9 +337,8 @@ void FaultInjector::TimeHasCome(const PassagePointer& passage) {
         const std::lock_guard lock(mutex);
         const auto found = passages.find(passage->original);
         waiting = found != passages.end() && found->second == passage;
-        passage->state = Passage::State::Submitting;
     }
-    if (waiting && PassOn(passage) != Errors::Success) {
+    if (waiting && (passage->polled ? Begin(passage) : PassOn(passage)) != Errors::Success) {
         passage->original->status = TransferStatus::DeviceGone;
         passage->original->actualLength = 0;
         passage->original->client->TransferCompleted(*passage->original);

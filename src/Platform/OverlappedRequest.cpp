@@ -39,12 +39,20 @@ bool OverlappedRequest::Started(Handle startedOn, bool completedAtOnce) {
 }
 
 bool OverlappedRequest::GetResult(std::uint32_t& transferred) {
+    return FetchResult(transferred, false);
+}
+
+bool OverlappedRequest::AwaitResult(std::uint32_t& transferred) {
+    return FetchResult(transferred, true);
+}
+
+bool OverlappedRequest::FetchResult(std::uint32_t& transferred, bool wait) {
     if (state == State::FailedToStart || state == State::Idle) {
         transferred = 0;
         SetLastError(state == State::Idle ? Errors::InvalidParameter : startError);
         return false;
     }
-    const bool succeeded = DeviceFiles().GetResult(file, record, transferred, false);
+    const bool succeeded = DeviceFiles().GetResult(file, record, transferred, wait);
     if (succeeded) {
         state = State::Completed;
         return true;

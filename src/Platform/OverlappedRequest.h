@@ -27,6 +27,8 @@ class OverlappedRequest final {
 
     /// Result of the last start, without waiting. After a start that failed: that failure again.
     bool GetResult(std::uint32_t& transferred);
+    /// The same, after waiting for the completion. The file's driver decides how long that may last.
+    bool AwaitResult(std::uint32_t& transferred);
 
     /// Cancels the transfer if it still runs, waits until it has completed, and gives the bytes it moved.
     /// `LastError` is left as it was.
@@ -39,6 +41,7 @@ class OverlappedRequest final {
     enum class State { Idle, Running, Completed, FailedToStart };
 
     bool Started(Handle startedOn, bool completedAtOnce);
+    bool FetchResult(std::uint32_t& transferred, bool wait);
 
     Overlapped record;
     Handle file = NoHandle;

@@ -149,10 +149,9 @@ std::uint32_t CUsbIo::IoctlSync(std::uint32_t code, const void* input, std::uint
             status = FailureCode();
         }
         if (status == Platform::Errors::IoPending) {
-            Platform::Wait(controlEvent.Get(), Platform::Infinite);
             status = Status::Success;
         }
-        if (status == Status::Success && !controlRequest->GetResult(transferred)) {
+        if (status == Status::Success && !controlRequest->AwaitResult(transferred)) {
             status = FailureCode();
         }
         if (controlRequest->IsRunning()) {  // the wait was refused; the caller's buffers must be free again

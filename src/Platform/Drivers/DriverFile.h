@@ -49,6 +49,11 @@ class DriverFile {
     virtual ErrorCode OutcomeOf(Usb::TransferStatus status) const = 0;
     virtual ErrorCode RefusalOf(ErrorCode usbCode) const = 0;
 
+    /// Milliseconds after which the driver gives up a transfer that its callers wait for without a limit of
+    /// their own, and the code it then ends with. 0: never.
+    virtual std::uint32_t TimeLimitOf(const Usb::Transfer& /*transfer*/) const { return 0; }
+    virtual ErrorCode TimedOutCode() const { return Errors::SemaphoreTimeout; }
+
     SharedDevice& Device() const { return *device; }
 
   private:

@@ -43,6 +43,8 @@ bool NotStarted(Overlapped& record, ErrorCode code) {
 /// off the list releases it and does not touch it afterwards.
 struct OpenFile::Waiter {
     const RunningRequest* request = nullptr;  ///< null: until the file is idle
+    std::uint64_t number = 0;                 ///< of the request
+    std::uint32_t limit = Infinite;           ///< ms, after which the driver gives the request up
     OwnedHandle event;                        ///< none if it cannot be made: then `released` is polled
     std::atomic<bool> released{false};
     Waiter* next = nullptr;
@@ -132,6 +134,7 @@ bool OpenFile::Start(std::uint32_t openedAs, const Operation& operation, Overlap
         Retire(*request);
         return true;
     }
+    LimitTime(*request);
     const ErrorCode refused = driver->Device().Submit(request->transfer);
     if (refused != Errors::Success) {
         const ErrorCode code = driver->RefusalOf(refused);
@@ -178,6 +181,7 @@ RunningRequest* OpenFile::Begin(std::uint32_t openedAs, Overlapped& record, Erro
     request->starter = std::this_thread::get_id();
     request->state.store(0, std::memory_order_relaxed);
     request->endpoint.store(RunningRequest::Undecided, std::memory_order_relaxed);
+    request->waitLimit.store(0, std::memory_order_relaxed);
     request->number = ++lastNumber;
     request->ended = false;
     request->previous = nullptr;
@@ -187,6 +191,30 @@ RunningRequest* OpenFile::Begin(std::uint32_t openedAs, Overlapped& record, Erro
     }
     running = request;
     return request;
+}
+
+/// Before the transfer is submitted. A control is waited for here, anything else wherever its starter likes.
+void OpenFile::LimitTime(RunningRequest& request) {
+    const std::uint32_t limit = driver->TimeLimitOf(request.transfer);
+    if (limit == 0) {
+        return;
+    }
+    if (request.transfer.endpoint == 0) {
+        request.waitLimit.store(limit, std::memory_order_relaxed);
+        return;
+    }
+    EventScheduler& scheduler = ClockScheduler();
+    try {
+        request.alarm = scheduler.CallAt(scheduler.Now() + std::uint64_t{limit} * 1000,
+                                         [this, number = request.number] { GiveUp(number); });
+    } catch (...) {
+        // No memory for the alarm: the transfer goes on without one.
+    }
+}
+
+void OpenFile::GiveUp(std::uint64_t number) {
+    Cancel([number](const RunningRequest& request) { return request.number == number; },
+           RunningRequest::CancelWanted | RunningRequest::TimedOut);
 }
 
 /// The starter's part of a cancellation that came before the device had the transfer.
@@ -211,7 +239,9 @@ void OpenFile::Ended(RunningRequest& request) {
 ErrorCode OpenFile::Finish(RunningRequest& request) {
     const Usb::Transfer& transfer = request.transfer;
     driver->Device().Learn(transfer);
-    const ErrorCode code = driver->OutcomeOf(transfer.status);
+    const bool timedOut = transfer.status == Usb::TransferStatus::Cancelled &&
+                          (request.state.load(std::memory_order_relaxed) & RunningRequest::TimedOut) != 0;
+    const ErrorCode code = timedOut ? driver->TimedOutCode() : driver->OutcomeOf(transfer.status);
     const std::uint32_t moved =
         transfer.actualLength < transfer.length ? transfer.actualLength : transfer.length;
     // The record first: `Close` lets go of the caller's memory as soon as the request is off the list.
@@ -221,6 +251,9 @@ ErrorCode OpenFile::Finish(RunningRequest& request) {
 }
 
 void OpenFile::Retire(RunningRequest& request) {
+    if (request.alarm != 0) {
+        ClockScheduler().Forget(std::exchange(request.alarm, 0));
+    }
     Waiter* released = nullptr;
     {
         const std::lock_guard guard(lock);
@@ -265,7 +298,7 @@ void OpenFile::Unpin(RunningRequest& request) {
 }
 
 template <class Matches>
-void OpenFile::Cancel(Matches matches) {
+void OpenFile::Cancel(Matches matches, std::uint32_t reason) {
     struct Chosen {
         RunningRequest* request;
         bool submitted;
@@ -282,8 +315,7 @@ void OpenFile::Cancel(Matches matches) {
                 if (request->number > newest || !matches(*request)) {
                     continue;
                 }
-                const std::uint32_t before =
-                    request->state.fetch_or(RunningRequest::CancelWanted, std::memory_order_acq_rel);
+                const std::uint32_t before = request->state.fetch_or(reason, std::memory_order_acq_rel);
                 if ((before & RunningRequest::CancelWanted) == 0) {
                     Pin(*request);
                     chosen[count++] = {request, (before & RunningRequest::Submitted) != 0};
@@ -334,6 +366,10 @@ bool OpenFile::WaitFor(std::uint32_t openedAs, const Overlapped& record) {
             }
             if (request != nullptr) {
                 waiter.request = request;
+                waiter.number = request->number;
+                if (const std::uint32_t limit = request->waitLimit.load(std::memory_order_relaxed)) {
+                    waiter.limit = limit;
+                }
                 Enlist(waiter);
                 enlisted = true;
             }
@@ -388,7 +424,12 @@ void OpenFile::Enlist(Waiter& waiter) {
 void OpenFile::Await(Waiter& waiter) {
     bool signalled = false;
     try {
-        signalled = waiter.event && Wait(waiter.event.Get(), Infinite) == WaitResult::Signalled;
+        WaitResult result = waiter.event ? Wait(waiter.event.Get(), waiter.limit) : WaitResult::Failed;
+        if (result == WaitResult::TimedOut) {
+            GiveUp(waiter.number);
+            result = Wait(waiter.event.Get(), Infinite);
+        }
+        signalled = result == WaitResult::Signalled;
     } catch (...) {
     }
     while (!signalled && !waiter.released.load(std::memory_order_acquire)) {

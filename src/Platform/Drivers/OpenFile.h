@@ -72,8 +72,10 @@ class OpenFile final {
     ErrorCode Finish(RunningRequest& request);
     void Retire(RunningRequest& request);
     void CancelAfterSubmit(RunningRequest& request);
+    void LimitTime(RunningRequest& request);
+    void GiveUp(std::uint64_t number);
     template <class Matches>
-    void Cancel(Matches matches);
+    void Cancel(Matches matches, std::uint32_t reason = RunningRequest::CancelWanted);
     void Pin(RunningRequest& request);
     void Unpin(RunningRequest& request);
     void Recycle(RunningRequest& request);

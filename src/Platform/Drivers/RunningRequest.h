@@ -5,6 +5,7 @@
 #include <thread>
 
 #include "Platform/DeviceFiles.h"
+#include "Platform/EventScheduler.h"
 #include "Platform/Usb/UsbDevice.h"
 
 namespace Varnholt::Platform::Drivers {
@@ -26,6 +27,7 @@ struct RunningRequest final : public Usb::TransferClient {
     static constexpr std::uint32_t Submitted = 1;
     static constexpr std::uint32_t Completed = 2;
     static constexpr std::uint32_t CancelWanted = 4;
+    static constexpr std::uint32_t TimedOut = 8;  ///< the cancellation is the driver's own
     static constexpr std::uint16_t Undecided = 0x100;
 
     explicit RunningRequest(OpenFile& owner) : file(owner) { transfer.client = this; }
@@ -38,6 +40,10 @@ struct RunningRequest final : public Usb::TransferClient {
     std::atomic<std::uint32_t> state{0};
     /// Where the transfer goes once that is decided; the transfer itself is not looked into meanwhile.
     std::atomic<std::uint16_t> endpoint{Undecided};
+    /// Milliseconds that a wait for the request lasts before the driver gives it up; 0: no limit.
+    std::atomic<std::uint32_t> waitLimit{0};
+    /// Gives up a request that is waited for elsewhere; 0: none.
+    EventScheduler::EventId alarm = 0;
 
     // Guarded by the file's lock.
     std::uint64_t number = 0;  ///< grows with each request of the file

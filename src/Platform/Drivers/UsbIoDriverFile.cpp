@@ -193,4 +193,14 @@ ErrorCode UsbIoDriverFile::RefusalOf(ErrorCode usbCode) const {
     return UsbIoRefusalOf(usbCode);
 }
 
+std::uint32_t UsbIoDriverFile::TimeLimitOf(const Usb::Transfer& transfer) const {
+    // What an instrument takes to answer a request or to store data: the slowest memory needs 10 ms a byte.
+    constexpr std::uint32_t answer = 5000;
+    constexpr std::uint32_t storeByte = 10;
+    if (transfer.endpoint == 0) {
+        return answer;
+    }
+    return transfer.IsIn() ? 0 : transfer.length * storeByte + answer;
+}
+
 }  // namespace Varnholt::Platform::Drivers

@@ -30,6 +30,8 @@ class UsbIoDriverFile final : public DriverFile {
 
     ErrorCode OutcomeOf(Usb::TransferStatus status) const override;
     ErrorCode RefusalOf(ErrorCode usbCode) const override;
+    std::uint32_t TimeLimitOf(const Usb::Transfer& transfer) const override;
+    ErrorCode TimedOutCode() const override { return Protocol::UsbIoDriver::Status::TimedOut; }
 
   private:
     Decision Move(Usb::Transfer& transfer, bool in) const;
