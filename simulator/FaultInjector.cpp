@@ -63,6 +63,11 @@ struct Passage : Transfer {
 };
 using PassagePointer = std::shared_ptr<Passage>;
 
+bool IsStandardRequest(const Transfer& transfer) {
+    constexpr std::uint8_t typeMask = 0x60;
+    return transfer.endpoint == 0 && (transfer.setup.requestType & typeMask) == 0;
+}
+
 void Shorten(Passage& passage, std::uint32_t length) {
     passage.length = std::min(passage.length, length);
     if (passage.endpoint == 0) {
@@ -168,7 +173,9 @@ ErrorCode FaultInjector::Submit(Transfer& transfer) try {
             return Errors::DeviceNotConnected;
         }
         passages[&transfer] = passage;
-        passage->fault = script->Next(transfer.endpoint);
+        if (!IsStandardRequest(transfer)) {
+            passage->fault = script->Next(transfer.endpoint);
+        }
         if (passage->Has(FaultKind::Stall) && transfer.endpoint != 0) {
             halted.insert(transfer.endpoint);
         } else if (halted.contains(transfer.endpoint)) {

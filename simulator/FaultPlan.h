@@ -50,7 +50,8 @@ struct Fault {
 ///
 /// Each fault is an index (from 0), a plus if it stays from then on, a colon and the fault's name, with its
 /// number where it has one; in front, perhaps, the kind of transfer that is counted instead of all:
-/// control, bulk-in, bulk-out or interrupt. Of two faults for one transfer the first counts.
+/// control, bulk-in, bulk-out or interrupt. Of two faults for one transfer the first counts. Standard
+/// requests, with which an operating system makes the device's acquaintance, are not counted and do not fail.
 class FaultPlan final {
   public:
     FaultPlan() = default;

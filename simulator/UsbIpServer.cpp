@@ -143,35 +143,40 @@ class UsbIpServer::Exports final : public UsbIpExports {
 /// A connected socket with its session. Never waits for its peer.
 class UsbIpServer::Connection final {
   public:
-    Connection(UsbIpServer& ownServer, int connectedSocket, std::unique_ptr<Exports> offeredInstruments,
-               std::string peer)
+    Connection(UsbIpServer& ownServer, int connectedSocket, std::vector<Exported*> offered, bool tcp,
+               const std::string& peer)
         : server(ownServer),
           file(connectedSocket),
-          peerText(std::move(peer)),
-          exports(std::move(offeredInstruments)) {}
+          peerText(peer),
+          exports(ownServer, std::move(offered), peer, tcp) {}
     ~Connection() {
         Abandon();
         session.reset();  // before the instrument counts as free again
-        exports.reset();
         close(file);
     }
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
 
+    /// Waits for what the peer wants.
     void Begin() {
-        session = std::make_unique<UsbIpSession>(*exports, [this] { FlushSoon(); });
+        session = std::make_unique<UsbIpSession>(exports, [this] { FlushSoon(); });
         Watch();
+    }
+    /// Begins with an instrument that the peer need not ask for; false when somebody else has it.
+    bool BeginWith(Exported& wanted) {
+        UsbIpExports::Import import = exports.Take(wanted);
+        if (!import.device) {
+            return false;
+        }
+        session = std::make_unique<UsbIpSession>(std::move(import.device), [this] { FlushSoon(); });
+        Watch();
+        return true;
     }
     /// No more is heard of it; it may be one of its own functions that is running.
     void Abandon() {
         abandoned = true;
         server.loop.Forget(flush);
         server.loop.Unwatch(file);
-    }
-
-    void BeginImported(std::shared_ptr<UsbDevice> device) {
-        session = std::make_unique<UsbIpSession>(std::move(device), [this] { FlushSoon(); });
-        Watch();
     }
 
   private:
@@ -247,7 +252,7 @@ class UsbIpServer::Connection final {
     UsbIpServer& server;
     const int file;
     const std::string peerText;
-    std::unique_ptr<Exports> exports;
+    Exports exports;
     std::unique_ptr<UsbIpSession> session;
     // Received and not taken yet. Its size bounds how long one peer keeps the others waiting.
     std::array<std::uint8_t, 65536> input{};
@@ -325,9 +330,17 @@ std::uint16_t UsbIpServer::ListenTcp(std::uint16_t port) {
     return ntohs(address.sin_port);
 }
 
-std::string UsbIpServer::TcpBusId(const std::string& name) const {
+UsbIpServer::Exported& UsbIpServer::Find(const std::string& name) {
     const auto found = std::ranges::find(exportedInstruments, name, &Exported::name);
-    return found == exportedInstruments.end() ? std::string() : found->BusId();
+    if (found == exportedInstruments.end()) {
+        throw std::runtime_error("no instrument named \"" + name + "\"");
+    }
+    return *found;
+}
+
+UsbIp::DeviceRecord UsbIpServer::Record(const std::string& name) {
+    const Exported& exported = Find(name);
+    return exported.Record(exported.BusId());
 }
 
 void UsbIpServer::ListenTo(int file, std::vector<Exported*> offered, bool unixSocket) {
@@ -377,28 +390,19 @@ void UsbIpServer::Accept(const Listener& listener) {
         close(file);
         return;
     }
-    connections.push_back(std::make_unique<Connection>(
-        *this, file, std::make_unique<Exports>(*this, listener.offered, peer, !listener.unixSocket), peer));
+    connections.push_back(
+        std::make_unique<Connection>(*this, file, listener.offered, !listener.unixSocket, peer));
     connections.back()->Begin();
 }
 
-void UsbIpServer::Serve(int connectedSocket, const std::string& name) {
-    const auto found = std::ranges::find(exportedInstruments, name, &Exported::name);
-    if (found == exportedInstruments.end()) {
-        close(connectedSocket);
-        throw std::runtime_error("no instrument named \"" + name + "\"");
-    }
+void UsbIpServer::Serve(int connectedSocket, const std::string& name, const std::string& peer) {
     fcntl(connectedSocket, F_SETFL, O_NONBLOCK);
-    auto exports = std::make_unique<Exports>(*this, std::vector<Exported*>{&*found},
-                                             "the peer of a given socket", false);
-    UsbIpExports::Import import = exports->Take(*found);
-    if (import.status != UsbIp::OperationStatus::Ok) {
-        close(connectedSocket);
+    auto connection =
+        std::make_unique<Connection>(*this, connectedSocket, std::vector<Exported*>(), false, peer);
+    if (!connection->BeginWith(Find(name))) {
         throw std::runtime_error("\"" + name + "\" is in use");
     }
-    connections.push_back(std::make_unique<Connection>(*this, connectedSocket, std::move(exports),
-                                                       "the peer of a given socket"));
-    connections.back()->BeginImported(std::move(import.device));
+    connections.push_back(std::move(connection));
 }
 
 void UsbIpServer::Remove(Connection& connection) {

@@ -41,11 +41,11 @@ class UsbIpServer final {
     std::uint16_t ListenTcp(std::uint16_t port);
 
     /// Serves a connected stream socket whose peer has nothing to import any more, such as a kernel. The
-    /// socket is the server's from then on. Throws as above.
-    void Serve(int connectedSocket, const std::string& name);
+    /// socket is the server's from then on; `peer` says who is there. Throws as above.
+    void Serve(int connectedSocket, const std::string& name, const std::string& peer);
 
-    /// The bus id under which TCP peers find an instrument.
-    std::string TcpBusId(const std::string& name) const;
+    /// How TCP peers find an instrument, and its device number.
+    Platform::Usb::UsbIp::DeviceRecord Record(const std::string& name);
 
   private:
     struct Exported;
@@ -59,6 +59,7 @@ class UsbIpServer final {
     };
 
     void ListenTo(int file, std::vector<Exported*> offered, bool unixSocket);
+    Exported& Find(const std::string& name);
     void Listen();
     void PauseListening();
     void Accept(const Listener& listener);

@@ -190,6 +190,20 @@ TEST_F(FaultInjectorTest, ShortRequestsReachTheInstrumentShort) {
     EXPECT_EQ((Bytes{0x01, 0x2D}), misc.Data());
 }
 
+TEST_F(FaultInjectorTest, StandardRequestsAreNeitherCountedNorFail) {
+    auto device = Open("0+:stall");
+    TestTransfer descriptor = TestTransfer::Control({0x80, 6, 0x0100, 0, 18}, Bytes(18));
+    device->Submit(descriptor);
+    EXPECT_EQ(TransferStatus::Completed, descriptor.status);
+    device = Open("0:stall");
+    TestTransfer again = TestTransfer::Control({0x80, 6, 0x0100, 0, 18}, Bytes(18));
+    TestTransfer reset = TestTransfer::Vendor(Request::Reset, {31});
+    device->Submit(again);
+    device->Submit(reset);
+    EXPECT_EQ(TransferStatus::Completed, again.status);
+    EXPECT_EQ(TransferStatus::Stalled, reset.status);
+}
+
 TEST_F(FaultInjectorTest, SilentTransferEndsWithItsCancellationOnly) {
     const auto device = Open("1+:silent");
     AskForMemory(*device, 10);

@@ -227,7 +227,7 @@ TEST_F(UsbIpServerTest, UnpluggedInstrumentIsGoneUntilItIsBack) {
 }
 
 TEST_F(UsbIpServerTest, FaultsCrossTheConnection) {
-    server.Add(name, {}, "bulk-in 0:stall; bulk-in 2:late-cancel; control 4:gone-before");
+    server.Add(name, {}, "bulk-in 0:stall; bulk-in 2:late-cancel; control 3:gone-before");
     for (int round = 0; round < 2; ++round) {
         const auto device = OpenAndClaim(name);
         WaitedTransfer stalled(BulkInEndpoint, WaitedTransfer::Room(64));
@@ -371,8 +371,9 @@ TEST_F(UsbIpServerTest, GivenSocketNeedsNoImport) {
     const auto instrument = server.Add(name);
     int files[2] = {-1, -1};
     ASSERT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, files));
-    server.Do([&] { server.Server().Serve(files[0], name); });
+    server.Do([&] { server.Server().Serve(files[0], name, "the test"); });
     EXPECT_EQ(Errors::Busy, Open(name)->Claim());
+    EXPECT_EQ("the test", Describe(name).usedBy);
     UsbIp::SubmitPacket packet;
     packet.sequence = 7;
     packet.in = true;

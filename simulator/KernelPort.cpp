@@ -1,0 +1,79 @@
+#include "KernelPort.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <optional>
+#include <sstream>
+#include <stdexcept>
+
+#include "Platform/Usb/UsbIpProtocol.h"
+
+namespace Varnholt::Simulator {
+namespace {
+
+/// The port of the least used controller: devices on one controller are made ready one after the other.
+std::optional<unsigned> FindFreePort(const std::string& folder) {
+    constexpr unsigned highest = 128;
+    constexpr unsigned isFree = 4;
+    std::optional<unsigned> best;
+    unsigned fewestUsed = ~0U;
+    for (unsigned controller = 0; controller < highest; ++controller) {
+        std::ifstream status(folder + "/status" + (controller ? "." + std::to_string(controller) : ""));
+        if (!status) {
+            break;
+        }
+        std::optional<unsigned> first;
+        unsigned used = 0;
+        std::string line;
+        while (std::getline(status, line)) {
+            std::istringstream fields(line);
+            std::string hub;
+            unsigned port = 0;
+            unsigned state = 0;
+            if (fields >> hub >> port >> state && hub == "hs") {
+                used += state == isFree ? 0 : 1;
+                first = state == isFree && !first ? std::optional(port) : first;
+            }
+        }
+        if (first && used < fewestUsed) {
+            best = first;
+            fewestUsed = used;
+        }
+    }
+    return best;
+}
+
+}  // namespace
+
+unsigned PlugIntoKernel(int connectedSocket, std::uint32_t deviceId, const std::string& folder) {
+    std::error_code error;
+    if (!std::filesystem::exists(folder, error)) {
+        throw std::runtime_error("the kernel's virtual USB host is not there; as root: modprobe vhci-hcd");
+    }
+    const auto port = FindFreePort(folder);
+    if (!port) {
+        throw std::runtime_error("no port of the kernel's virtual USB host is free");
+    }
+    const std::string order = std::to_string(*port) + " " + std::to_string(connectedSocket) + " " +
+                              std::to_string(deviceId) + " " +
+                              std::to_string(Platform::Usb::UsbIp::HighSpeed);
+    const int file = open((folder + "/attach").c_str(), O_WRONLY | O_CLOEXEC);
+    const bool written =
+        file >= 0 && write(file, order.data(), order.size()) == static_cast<ssize_t>(order.size());
+    const int reason = errno;
+    if (file >= 0) {
+        close(file);
+    }
+    if (!written) {
+        throw std::runtime_error("the kernel does not take the device: " +
+                                 std::string(std::strerror(reason)));
+    }
+    return *port;
+}
+
+}  // namespace Varnholt::Simulator

@@ -1,0 +1,80 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include "KernelPort.h"
+
+namespace Varnholt::Simulator {
+namespace {
+
+constexpr const char* Heading = "hub port sta spd dev      sockfd local_busid\n";
+constexpr const char* Attached = " 006 003 00010002 000003 3-1\n";
+constexpr const char* Free = " 004 000 00000000 000000 0-0\n";
+
+class KernelPortTest : public testing::Test {
+  protected:
+    KernelPortTest() { std::filesystem::create_directory(folder); }
+    ~KernelPortTest() override { std::filesystem::remove_all(folder); }
+    void Write(const std::string& name, const std::string& text) {
+        std::ofstream(folder + "/" + name) << text;
+    }
+
+    const std::string folder =
+        std::filesystem::temp_directory_path() / ("ostra-vhci-" + std::to_string(getpid()));
+};
+
+TEST_F(KernelPortTest, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
+    struct Case {
+        const char* name;
+        std::vector<std::string> controllers;
+        std::string order;  ///< empty: none is free
+    };
+    const std::string port0 = "hs  0000";
+    const std::string port1 = "hs  0001";
+    const std::string port30 = "hs  0030";
+    for (const Case& test : {
+             Case{
+                 "all free", {port0 + Free + port1 + Free + "ss  0015" + Free, port30 + Free}, "0 7 65538 3"},
+             Case{"one used", {port0 + Attached + port1 + Free, port30 + Free}, "30 7 65538 3"},
+             Case{"only beside a used one",
+                  {port0 + Attached + port1 + Free, port30 + Attached},
+                  "1 7 65538 3"},
+             Case{"super speed only", {"ss  0015" + std::string(Free)}, ""},
+             Case{"all used", {port0 + Attached, port30 + Attached}, ""},
+         }) {
+        std::filesystem::remove_all(folder);
+        std::filesystem::create_directory(folder);
+        Write("attach", "");
+        for (std::size_t i = 0; i < test.controllers.size(); ++i) {
+            Write("status" + (i == 0 ? "" : "." + std::to_string(i)), Heading + test.controllers[i]);
+        }
+        if (test.order.empty()) {
+            EXPECT_THROW(PlugIntoKernel(7, 0x10002, folder), std::runtime_error) << test.name;
+            continue;
+        }
+        EXPECT_EQ(std::stoul(test.order), PlugIntoKernel(7, 0x10002, folder)) << test.name;
+        std::ifstream written(folder + "/attach");
+        EXPECT_EQ(test.order, std::string(std::istreambuf_iterator<char>(written), {})) << test.name;
+    }
+}
+
+TEST_F(KernelPortTest, SaysWhatToDoWhereThereIsNoSuchHost) {
+    try {
+        PlugIntoKernel(7, 0x10002, folder + "/missing");
+        ADD_FAILURE();
+    } catch (const std::runtime_error& error) {
+        EXPECT_THAT(error.what(), testing::HasSubstr("modprobe vhci-hcd"));
+    }
+    Write("status", Heading + std::string("hs  0000") + Free);
+    EXPECT_THROW(PlugIntoKernel(7, 0x10002, folder), std::runtime_error) << "nothing to write the order to";
+}
+
+}  // namespace
+}  // namespace Varnholt::Simulator
