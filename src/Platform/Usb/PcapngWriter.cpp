@@ -48,12 +48,14 @@ constexpr std::int32_t StatusInProgress = -115;
 class Bytes {
   public:
     void Put16(std::uint16_t value) {
-        bytes.resize(bytes.size() + 2);
-        Protocol::StoreLittle16(&bytes[bytes.size() - 2], value);
+        std::array<std::uint8_t, 2> stored;
+        Protocol::StoreLittle16(stored.data(), value);
+        Append(stored);
     }
     void Put32(std::uint32_t value) {
-        bytes.resize(bytes.size() + 4);
-        Protocol::StoreLittle32(&bytes[bytes.size() - 4], value);
+        std::array<std::uint8_t, 4> stored;
+        Protocol::StoreLittle32(stored.data(), value);
+        Append(stored);
     }
     void Append(std::span<const std::uint8_t> data) { bytes.insert(bytes.end(), data.begin(), data.end()); }
     void PadToWord() { bytes.resize((bytes.size() + 3) / 4 * 4); }
