@@ -3,158 +3,15 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <sstream>
 
 #include "Platform/EventScheduler.h"
 
 namespace Varnholt::Tests {
 
 using Platform::ErrorCode;
-using Platform::Usb::SetupPacket;
 using Platform::Usb::Transfer;
 using Platform::Usb::TransferStatus;
 namespace Errors = Platform::Errors;
-
-namespace {
-
-std::string DescribeTransfer(std::uint8_t endpoint, const SetupPacket& setup, bool isIn,
-                             const std::uint8_t* data, std::uint32_t length) {
-    std::ostringstream text;
-    text << (isIn ? "IN  " : "OUT ") << Hex(&endpoint, 1);
-    if (endpoint == 0) {
-        const std::uint8_t bytes[] = {setup.requestType,
-                                      setup.request,
-                                      static_cast<std::uint8_t>(setup.value),
-                                      static_cast<std::uint8_t>(setup.value >> 8),
-                                      static_cast<std::uint8_t>(setup.index),
-                                      static_cast<std::uint8_t>(setup.index >> 8),
-                                      static_cast<std::uint8_t>(setup.length),
-                                      static_cast<std::uint8_t>(setup.length >> 8)};
-        text << " setup " << Hex(bytes, sizeof bytes);
-    }
-    text << " length " << length;
-    if (!isIn && length > 0) {
-        text << " data " << Hex(data, length);
-    }
-    return text.str();
-}
-
-std::string DescribeTransfer(const Transfer& transfer) {
-    return DescribeTransfer(transfer.endpoint, transfer.setup, transfer.IsIn(), transfer.data,
-                            transfer.length);
-}
-
-std::string DescribeHaltCleared(std::uint8_t endpoint) {
-    return "clear halt of " + Hex(&endpoint, 1);
-}
-
-bool IsIn(const Exchange& row) {
-    return row.endpoint == 0 ? row.setup.IsIn() : (row.endpoint & 0x80) != 0;
-}
-
-}  // namespace
-
-Bytes Counting(std::size_t count, unsigned first) {
-    Bytes bytes(count);
-    std::generate(bytes.begin(), bytes.end(), [&first] { return static_cast<std::uint8_t>(first++); });
-    return bytes;
-}
-
-std::string Hex(const std::uint8_t* bytes, std::size_t count) {
-    constexpr const char* Digits = "0123456789ABCDEF";
-    std::string text;
-    for (std::size_t i = 0; i < count; ++i) {
-        text += i > 0 ? " " : "";
-        text += Digits[bytes[i] >> 4];
-        text += Digits[bytes[i] & 0x0F];
-    }
-    return text;
-}
-
-Exchange Exchange::Ends(TransferStatus how, std::uint32_t bytes) const {
-    Exchange row = *this;
-    row.status = how;
-    row.moved = bytes;
-    return row;
-}
-
-Exchange Exchange::Refused(ErrorCode code) const {
-    Exchange row = *this;
-    row.refusal = code;
-    return row;
-}
-
-Exchange Exchange::AtOnce() const {
-    Exchange row = *this;
-    row.when = When::AtOnce;
-    return row;
-}
-
-Exchange Exchange::After(std::uint64_t microseconds) const {
-    Exchange row = *this;
-    row.when = When::Later;
-    row.delay = microseconds;
-    return row;
-}
-
-Exchange Exchange::OnDemand() const {
-    Exchange row = *this;
-    row.when = When::OnDemand;
-    return row;
-}
-
-Exchange Exchange::MovesWhenCancelled(std::uint32_t bytes) const {
-    Exchange row = *this;
-    row.movedWhenCancelled = bytes;
-    return row;
-}
-
-std::string Exchange::Describe() const {
-    return kind == Kind::ClearHalt ? DescribeHaltCleared(endpoint)
-                                   : DescribeTransfer(endpoint, setup, IsIn(*this), sent.data(), length);
-}
-
-Exchange VendorOut(std::uint8_t request, Bytes data, std::uint16_t value, std::uint16_t index) {
-    Exchange row;
-    row.length = static_cast<std::uint32_t>(data.size());
-    row.moved = row.length;
-    row.setup = {Protocol::VendorOut, request, value, index, static_cast<std::uint16_t>(data.size())};
-    row.sent = std::move(data);
-    return row;
-}
-
-Exchange VendorIn(std::uint8_t request, std::uint16_t length, Bytes answer, std::uint16_t value,
-                  std::uint16_t index) {
-    Exchange row = BulkIn(length, std::move(answer), 0);
-    row.setup = {Protocol::VendorIn, request, value, index, length};
-    return row;
-}
-
-Exchange BulkOut(Bytes data, std::uint8_t endpoint) {
-    Exchange row;
-    row.endpoint = endpoint;
-    row.length = static_cast<std::uint32_t>(data.size());
-    row.moved = row.length;
-    row.sent = std::move(data);
-    return row;
-}
-
-Exchange BulkIn(std::uint32_t length, Bytes answer, std::uint8_t endpoint) {
-    Exchange row;
-    row.endpoint = endpoint;
-    row.length = length;
-    row.status = answer.size() > length ? TransferStatus::Overflow : TransferStatus::Completed;
-    row.moved = std::min(length, static_cast<std::uint32_t>(answer.size()));
-    row.received = std::move(answer);
-    return row;
-}
-
-Exchange HaltCleared(std::uint8_t endpoint) {
-    Exchange row;
-    row.kind = Exchange::Kind::ClearHalt;
-    row.endpoint = endpoint;
-    return row;
-}
 
 ScriptedUsbDevice::ScriptedUsbDevice(std::vector<Exchange> rows, Pace pace)
     : script(std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end())), defaultPace(pace) {}
@@ -313,7 +170,7 @@ ErrorCode ScriptedUsbDevice::Submit(Transfer& transfer) {
                 when = Exchange::When::AtOnce;
             }
         } else if (script.empty() || !Matches(script.front(), transfer)) {
-            Mismatch(DescribeTransfer(transfer));
+            Mismatch(Describe(transfer));
             submitted.row.status = TransferStatus::Stalled;
         } else {
             submitted.row = std::move(script.front());
@@ -383,7 +240,7 @@ ErrorCode ScriptedUsbDevice::ClearHalt(std::uint8_t endpoint) {
     }
     if (script.empty() || script.front().kind != Exchange::Kind::ClearHalt ||
         script.front().endpoint != endpoint) {
-        Mismatch(DescribeHaltCleared(endpoint));
+        Mismatch(HaltCleared(endpoint).Describe());
         return Errors::Success;
     }
     const ErrorCode answer = script.front().refusal;
@@ -414,7 +271,7 @@ bool ScriptedUsbDevice::Matches(const Exchange& row, const Transfer& transfer) c
     return row.kind == Exchange::Kind::Transfer && row.endpoint == transfer.endpoint &&
            !halted.contains(transfer.endpoint) && row.length == transfer.length &&
            (row.endpoint != 0 || row.setup == transfer.setup) &&
-           (IsIn(row) || std::equal(row.sent.begin(), row.sent.end(), transfer.data));
+           (row.IsIn() || std::equal(row.sent.begin(), row.sent.end(), transfer.data));
 }
 
 void ScriptedUsbDevice::Mismatch(const std::string& actual) {

@@ -10,65 +10,11 @@
 #include <vector>
 
 #include "Platform/Usb/UsbDevice.h"
-#include "Protocol/Instrument.h"
+#include "Support/Exchange.h"
 
 /// A USB device that plays a table: each row is a transfer expected and the answer to it. A transfer that
 /// does not match its row fails the test with both sides as hex.
 namespace Varnholt::Tests {
-
-using Bytes = std::vector<std::uint8_t>;
-
-/// `count` bytes that tell their place: first, first + 1, ...
-Bytes Counting(std::size_t count, unsigned first = 0);
-/// "1F 00 A2"
-std::string Hex(const std::uint8_t* bytes, std::size_t count);
-
-/// One row. Made by the functions below, refined by its members:
-///
-///     VendorOut(0xCA, {0x1F})
-///     BulkIn(256, Counting(256)).After(20'000)
-///     BulkIn(512, Counting(512)).Ends(TransferStatus::Stalled, 100)
-struct Exchange {
-    enum class Kind { Transfer, ClearHalt };
-    enum class When { AsPaced, AtOnce, Later, OnDemand };
-
-    Kind kind = Kind::Transfer;
-    std::uint8_t endpoint = 0;
-    Platform::Usb::SetupPacket setup;  ///< endpoint 0
-    Bytes sent;                        ///< OUT: the data expected
-    std::uint32_t length = 0;          ///< bytes asked for or sent
-
-    Bytes received;  ///< IN: the answer
-    Platform::Usb::TransferStatus status = Platform::Usb::TransferStatus::Completed;
-    std::uint32_t moved = 0;  ///< bytes moved at completion
-    std::uint32_t movedWhenCancelled = 0;
-    Platform::ErrorCode refusal = Platform::Errors::Success;  ///< `Submit` or `ClearHalt` answers this
-    When when = When::AsPaced;
-    std::uint64_t delay = 0;  ///< microseconds, with `When::Later`
-
-    /// Ends with this status after this many bytes.
-    Exchange Ends(Platform::Usb::TransferStatus how, std::uint32_t bytes = 0) const;
-    /// Is not accepted, with this code.
-    Exchange Refused(Platform::ErrorCode code) const;
-    Exchange AtOnce() const;
-    /// Completes that many microseconds after it was submitted, on the clock's scheduler.
-    Exchange After(std::uint64_t microseconds) const;
-    /// Completes when the test says so (`CompleteNext`), or never.
-    Exchange OnDemand() const;
-    /// A cancellation finds that many bytes moved.
-    Exchange MovesWhenCancelled(std::uint32_t bytes) const;
-
-    std::string Describe() const;
-};
-
-Exchange VendorOut(std::uint8_t request, Bytes data, std::uint16_t value = 0, std::uint16_t index = 0);
-Exchange VendorIn(std::uint8_t request, std::uint16_t length, Bytes answer, std::uint16_t value = 0,
-                  std::uint16_t index = 0);
-Exchange BulkOut(Bytes data, std::uint8_t endpoint = Protocol::BulkOutEndpoint);
-/// Also for the interrupt endpoint. An answer shorter than `length` is a short transfer.
-Exchange BulkIn(std::uint32_t length, Bytes answer, std::uint8_t endpoint = Protocol::BulkInEndpoint);
-/// The driver clears the halt of an endpoint.
-Exchange HaltCleared(std::uint8_t endpoint);
 
 /// The order of submission is the order of the table; transfers of one endpoint complete in that order. All
 /// operations may be called from any thread. A device that the test has unplugged refuses everything.

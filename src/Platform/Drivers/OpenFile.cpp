@@ -5,8 +5,6 @@
 #include <utility>
 
 #include "Platform/Drivers/RecordState.h"
-#include "Platform/Threads.h"
-#include "Platform/WaitableObjects.h"
 
 namespace Varnholt::Platform::Drivers {
 namespace {
@@ -38,17 +36,6 @@ bool NotStarted(Overlapped& record, ErrorCode code) {
 }
 
 }  // namespace
-
-/// A thread that waits for the end of one request, or of all. Lives on that thread's stack; whoever takes it
-/// off the list releases it and does not touch it afterwards.
-struct OpenFile::Waiter {
-    const RunningRequest* request = nullptr;  ///< null: until the file is idle
-    std::uint64_t number = 0;                 ///< of the request
-    std::uint32_t limit = Infinite;           ///< ms, after which the driver gives the request up
-    OwnedHandle event;                        ///< none if it cannot be made: then `released` is polled
-    std::atomic<bool> released{false};
-    Waiter* next = nullptr;
-};
 
 void RunningRequest::TransferCompleted(Usb::Transfer&) noexcept {
     if ((state.fetch_or(Completed, std::memory_order_acq_rel) & Submitted) != 0) {
@@ -267,7 +254,7 @@ void OpenFile::Retire(RunningRequest& request) {
         }
         released = waiters != nullptr ? TakeReleased() : nullptr;
     }
-    Release(released);
+    Waiter::Release(released);
 }
 
 void OpenFile::Recycle(RunningRequest& request) {
@@ -294,7 +281,7 @@ void OpenFile::Unpin(RunningRequest& request) {
         }
         released = waiters != nullptr ? TakeReleased() : nullptr;
     }
-    Release(released);
+    Waiter::Release(released);
 }
 
 template <class Matches>
@@ -356,7 +343,7 @@ void OpenFile::CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint)
 bool OpenFile::WaitFor(std::uint32_t openedAs, const Overlapped& record) {
     while (IsRunning(record)) {
         Waiter waiter;
-        GiveEvent(waiter);
+        Equip(waiter);
         bool enlisted = false;
         {
             const std::lock_guard guard(lock);
@@ -391,7 +378,7 @@ void OpenFile::AwaitIdle() {
         }
     }
     Waiter waiter;
-    GiveEvent(waiter);
+    Equip(waiter);
     {
         const std::lock_guard guard(lock);
         if (IsIdle()) {
@@ -402,18 +389,13 @@ void OpenFile::AwaitIdle() {
     Await(waiter);
 }
 
-void OpenFile::GiveEvent(Waiter& waiter) {
+void OpenFile::Equip(Waiter& waiter) {
+    OwnedHandle event;
     {
         const std::lock_guard guard(lock);
-        waiter.event = std::move(spareEvent);
+        std::swap(event, spareEvent);
     }
-    try {
-        if (!waiter.event) {
-            waiter.event = OwnedHandle(MakeAutoResetEvent());
-        }
-    } catch (...) {
-        // The wait must go on: a buffer is in use.
-    }
+    waiter.Equip(std::move(event));
 }
 
 void OpenFile::Enlist(Waiter& waiter) {
@@ -422,28 +404,15 @@ void OpenFile::Enlist(Waiter& waiter) {
 }
 
 void OpenFile::Await(Waiter& waiter) {
-    bool signalled = false;
-    try {
-        WaitResult result = waiter.event ? Wait(waiter.event.Get(), waiter.limit) : WaitResult::Failed;
-        if (result == WaitResult::TimedOut) {
-            GiveUp(waiter.number);
-            result = Wait(waiter.event.Get(), Infinite);
-        }
-        signalled = result == WaitResult::Signalled;
-    } catch (...) {
+    if (!waiter.AwaitFor(waiter.limit)) {
+        GiveUp(waiter.number);
     }
-    while (!signalled && !waiter.released.load(std::memory_order_acquire)) {
-        Pause(1);
-    }
-    if (signalled) {
-        const std::lock_guard guard(lock);
-        if (!spareEvent) {
-            spareEvent = std::move(waiter.event);
-        }
-    }
+    OwnedHandle event = waiter.Await();
+    const std::lock_guard guard(lock);
+    std::swap(spareEvent, event);
 }
 
-OpenFile::Waiter* OpenFile::TakeReleased() {
+Waiter* OpenFile::TakeReleased() {
     Waiter* released = nullptr;
     for (Waiter** link = &waiters; *link != nullptr;) {
         Waiter* const waiter = *link;
@@ -456,17 +425,6 @@ OpenFile::Waiter* OpenFile::TakeReleased() {
         }
     }
     return released;
-}
-
-void OpenFile::Release(Waiter* first) {
-    while (first != nullptr) {
-        Waiter& waiter = *std::exchange(first, first->next);
-        const Handle event = waiter.event.Get();
-        waiter.released.store(true, std::memory_order_release);
-        if (event != NoHandle) {
-            SignalSurely(event);
-        }
-    }
 }
 
 }  // namespace Varnholt::Platform::Drivers

@@ -9,6 +9,7 @@
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFile.h"
 #include "Platform/Drivers/RunningRequest.h"
+#include "Platform/Drivers/Waiter.h"
 
 namespace Varnholt::Platform::Drivers {
 
@@ -66,7 +67,6 @@ class OpenFile final {
 
   private:
     enum class Use { Free, Open, Closing, Closed };
-    struct Waiter;
 
     RunningRequest* Begin(std::uint32_t openedAs, Overlapped& record, ErrorCode& error);
     ErrorCode Finish(RunningRequest& request);
@@ -79,12 +79,11 @@ class OpenFile final {
     void Pin(RunningRequest& request);
     void Unpin(RunningRequest& request);
     void Recycle(RunningRequest& request);
-    void GiveEvent(Waiter& waiter);
+    void Equip(Waiter& waiter);
     void Enlist(Waiter& waiter);
     void Await(Waiter& waiter);
     void AwaitIdle();
     Waiter* TakeReleased();
-    static void Release(Waiter* first);
     bool IsIdle() const { return running == nullptr && pinned == 0; }
 
     mutable std::mutex lock;  ///< guards what follows; no other lock is taken while it is held

@@ -1,4 +1,5 @@
 #include "Platform/Drivers/DriverFixture.h"
+#include "Support/TestClock.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -248,6 +249,34 @@ TEST_F(UsbIoDriver, AbortEndsTheTransfersOfThePipe) {
     EXPECT_EQ(Result(in, requests[1], true), (Outcome{Status::Cancelled, 0}));
     EXPECT_EQ(Result(interrupt, requests[2]).code, Errors::IoIncomplete);
     EXPECT_TRUE(files->CloseFile(interrupt));
+}
+
+TEST_F(UsbIoDriver, GivesUpWhatNobodyElseLimits) {
+    const TestClock clock(TestTime::Virtual);
+    if (!clock.IsVirtual()) {
+        GTEST_SKIP() << "takes eleven seconds of real time";
+    }
+    device->Expect({VendorOut(0xC0, {}).OnDemand(), VendorIn(0xC2, 8, Counting(8)).After(4'999'000),
+                    BulkOut(Counting(100)).OnDemand().MovesWhenCancelled(64), BulkOut({1}).After(5'000'000),
+                    BulkIn(8, {}).OnDemand()});
+    const auto out = OpenBound(Out);
+    const auto in = OpenBound(In);
+    Bytes buffer(8);
+    const Stopwatch control(clock);
+    EXPECT_EQ(Control(out, Code::ClassOrVendorOutRequest, RequestBlock(0xC0)),
+              (Outcome{Status::TimedOut, 0}));
+    control.Expect(5000);
+    EXPECT_EQ(Control(out, Code::ClassOrVendorInRequest, RequestBlock(0xC2), buffer), (Outcome{0, 8}));
+    const Stopwatch write(clock);
+    EXPECT_EQ(Write(out, Counting(100)), (Outcome{Status::TimedOut, 64}));
+    write.Expect(6000);
+    EXPECT_EQ(Write(out, {1}), (Outcome{0, 1}));
+
+    Request reading;
+    StartPending(in, buffer, reading);
+    EXPECT_EQ(Platform::Wait(reading.event.Get(), 100'000), Platform::WaitResult::TimedOut)
+        << "who reads has a limit of his own";
+    EXPECT_TRUE(files->CloseFile(in));
 }
 
 TEST_F(UsbIoDriver, HasACodeForEveryOutcome) {
