@@ -63,7 +63,7 @@ std::string Hash(const std::string& name) {
 /// A file that is open and mapped.
 class SharedFile::OpenFile final {
   public:
-    explicit OpenFile(int opened) : descriptor(opened) {}
+    OpenFile() = default;
     ~OpenFile() {
         Unmap();
         if (descriptor >= 0) {
@@ -73,7 +73,12 @@ class SharedFile::OpenFile final {
     OpenFile(const OpenFile&) = delete;
     OpenFile& operator=(const OpenFile&) = delete;
 
-    bool IsOpen() const { return descriptor >= 0; }
+    /// Once; false with the reason in `errno`. The object is there before the file is, so that no failure
+    /// comes between the two.
+    bool Open(const char* path, int flags, mode_t mode = 0) {
+        descriptor = open(path, flags, mode);
+        return descriptor >= 0;
+    }
     int Get() const { return descriptor; }
     void* Memory() const { return memory; }
 
@@ -93,7 +98,7 @@ class SharedFile::OpenFile final {
     }
 
   private:
-    const int descriptor;
+    int descriptor = -1;
     void* memory = nullptr;
     std::size_t size = 0;
 };
@@ -114,10 +119,10 @@ struct SharedFile::Attempts {
     /// Makes the file without a name, fills it, and then gives it its name if nobody has taken that
     /// meanwhile.
     static Attempt Make(const std::string& path, const SharedFile::Content& content) {
-        auto file =
-            std::make_unique<OpenFile>(open(Directory, O_TMPFILE | O_RDWR | O_CLOEXEC, S_IRUSR | S_IWUSR));
-        if (!file->IsOpen() || ftruncate(file->Get(), static_cast<off_t>(content.size)) != 0 ||
-            !file->Map(content.size) || flock(file->Get(), LOCK_SH | LOCK_NB) != 0) {
+        auto file = std::make_unique<OpenFile>();
+        if (!file->Open(Directory, O_TMPFILE | O_RDWR | O_CLOEXEC, S_IRUSR | S_IWUSR) ||
+            ftruncate(file->Get(), static_cast<off_t>(content.size)) != 0 || !file->Map(content.size) ||
+            flock(file->Get(), LOCK_SH | LOCK_NB) != 0) {
             return Fail(CodeOf(errno));
         }
         if (!content.initialise(file->Memory(), content.argument)) {
@@ -165,9 +170,8 @@ struct SharedFile::Attempts {
     static Attempt OpenOrMake(const std::string& path, const SharedFile::Content& content) {
         // Not to be kept waiting by a named pipe either, and no link to be followed: the directory is
         // everybody's.
-        auto file =
-            std::make_unique<OpenFile>(open(path.c_str(), O_RDWR | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
-        if (file->IsOpen()) {
+        auto file = std::make_unique<OpenFile>();
+        if (file->Open(path.c_str(), O_RDWR | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC)) {
             return Join(std::move(file), path, content);
         }
         return errno == ENOENT ? Make(path, content) : Fail(CodeOf(errno));
