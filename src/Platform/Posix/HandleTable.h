@@ -34,4 +34,15 @@ class HandleTable final {
     std::uintptr_t last = 0;                      // guarded by `lock`
 };
 
+/// Runs what makes an object and its handle. Without memory for them there is none, and `LastError` says so.
+template <typename Make>
+Handle HandleOf(Make make) {
+    try {
+        return make();
+    } catch (const std::bad_alloc&) {
+        SetLastError(Errors::NotEnoughMemory);
+        return NoHandle;
+    }
+}
+
 }  // namespace Varnholt::Platform::Posix

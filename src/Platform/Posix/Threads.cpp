@@ -51,10 +51,9 @@ constexpr int NicePerLevel = 5;
 
 }  // namespace
 
-Handle StartThread(ThreadEntry entry, void* argument) {
-    if (CallMustFail("StartThread")) {
-        return NoHandle;
-    }
+namespace {
+
+Handle StartMadeThread(ThreadEntry entry, void* argument) {
     auto start = std::make_unique<Start>(Start{entry, argument, std::make_shared<ThreadObject>()});
     const std::shared_ptr<ThreadObject> object = start->object;
     ThreadRecord& record = *start->record;
@@ -78,6 +77,15 @@ Handle StartThread(ThreadEntry entry, void* argument) {
     KernelHold hold(KernelLock());
     CurrentClock().Preempt(hold);
     return handle;
+}
+
+}  // namespace
+
+Handle StartThread(ThreadEntry entry, void* argument) {
+    if (CallMustFail("StartThread")) {
+        return NoHandle;
+    }
+    return HandleOf([=] { return StartMadeThread(entry, argument); });
 }
 
 bool EndThreadByForce(Handle thread, std::uint32_t /*exitCode*/) {

@@ -61,7 +61,10 @@ WaitAnyResult WaitForObjects(std::span<const ObjectRef> objects, std::uint32_t t
 }  // namespace
 
 Handle MakeAutoResetEvent() {
-    return CallMustFail("MakeAutoResetEvent") ? NoHandle : AddIfMade(std::make_shared<EventObject>());
+    if (CallMustFail("MakeAutoResetEvent")) {
+        return NoHandle;
+    }
+    return HandleOf([] { return AddIfMade(std::make_shared<EventObject>()); });
 }
 
 bool SignalEvent(Handle event) {
@@ -73,7 +76,8 @@ Handle MakeMutex(const std::string& name) {
     if (CallMustFail("MakeMutex")) {
         return NoHandle;
     }
-    return AddIfMade(name.empty() ? std::make_shared<MutexObject>() : OpenSharedMutex(name));
+    return HandleOf(
+        [&] { return AddIfMade(name.empty() ? std::make_shared<MutexObject>() : OpenSharedMutex(name)); });
 }
 
 bool ReleaseMutex(Handle mutex) {
@@ -89,10 +93,10 @@ Handle MakeSemaphore(std::int32_t initialCount, std::int32_t maximumCount, const
         SetLastError(Errors::InvalidParameter);
         return NoHandle;
     }
-    if (name.empty()) {
-        return AddIfMade(std::make_shared<LocalSemaphore>(initialCount, maximumCount));
-    }
-    return AddIfMade(OpenSharedSemaphore(initialCount, maximumCount, name));
+    return HandleOf([&] {
+        return AddIfMade(name.empty() ? std::make_shared<LocalSemaphore>(initialCount, maximumCount)
+                                      : OpenSharedSemaphore(initialCount, maximumCount, name));
+    });
 }
 
 bool ReleaseSemaphore(Handle semaphore, std::int32_t count) {
