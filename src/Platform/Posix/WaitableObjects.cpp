@@ -44,7 +44,8 @@ bool OnObject(Handle handle, Action action) {
     return Succeeded(code);
 }
 
-WaitAnyResult WaitForObjects(std::span<const ObjectRef> objects, std::uint32_t timeout) {
+/// A wait that there is no memory for fails; it throws nothing, because destructors wait.
+WaitAnyResult WaitForObjects(std::span<const ObjectRef> objects, std::uint32_t timeout) try {
     const Microseconds deadline = DeadlineAfter(timeout);
     WaitAnyResult outcome{};
     {
@@ -56,6 +57,9 @@ WaitAnyResult WaitForObjects(std::span<const ObjectRef> objects, std::uint32_t t
         objects[outcome.index]->AfterWait();
     }
     return outcome;
+} catch (const std::bad_alloc&) {
+    SetLastError(Errors::NotEnoughMemory);
+    return {WaitResult::Failed, 0};
 }
 
 }  // namespace
