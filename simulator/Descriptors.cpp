@@ -32,9 +32,7 @@ class DescriptorWriter final {
         return *this;
     }
     DescriptorWriter& Word(std::uint16_t value) {
-        bytes.resize(bytes.size() + 2);
-        Protocol::StoreLittle16(&bytes[bytes.size() - 2], value);
-        return *this;
+        return Byte(static_cast<std::uint8_t>(value)).Byte(static_cast<std::uint8_t>(value >> 8));
     }
     std::vector<std::uint8_t> Finish() {
         EndCurrent();
