@@ -9,12 +9,6 @@
 #include "Platform/Threads.h"
 
 namespace Varnholt::Interface {
-namespace {
-
-constexpr std::uint32_t WaitBeforeReadout = 1000;  // ms
-constexpr std::uint32_t ReadoutTimeout = 1;        // s
-
-}  // namespace
 
 void WriteImage(std::span<const std::uint8_t, Protocol::EepromSize> image, const std::string& deviceName) {
     const auto instrument = OpenInstrumentByName(deviceName);
@@ -23,10 +17,10 @@ void WriteImage(std::span<const std::uint8_t, Protocol::EepromSize> image, const
 
 void TakeReadout(std::span<std::int32_t, Protocol::ReadoutValues> values, const std::string& deviceName) {
     const auto instrument = OpenInstrumentByName(deviceName);
-    Platform::SleepMilliseconds(WaitBeforeReadout);
-    instrument->SetMeasureParameters(294, 0, 1, 6);
+    Platform::SleepMilliseconds(FixedReadout::WaitAfterOpening);
+    instrument->SetMeasureParameters(FixedReadout::P1, FixedReadout::P2, FixedReadout::P3, FixedReadout::P4);
     std::array<std::uint8_t, Protocol::ReadoutBytes> buffer{};
-    instrument->MeasureRequest(buffer.data(), Protocol::ReadoutBytes, ReadoutTimeout);
+    instrument->MeasureRequest(buffer.data(), Protocol::ReadoutBytes, FixedReadout::Timeout);
     std::ranges::copy(ReadoutFromBytes(buffer), values.begin());
 }
 

@@ -66,8 +66,8 @@ class DeviceFileSystem {
 /// The file system in force: the operating system's, unless a test put another in its place.
 DeviceFileSystem& DeviceFiles();
 
-/// Puts `fileSystem` in the place of the system's own for the object's life. For tests; not while files are
-/// open.
+/// Puts `fileSystem` in the place of the one in force for the object's life: a test's own, or one that stands
+/// before the system's. Not while files are open.
 class ScopedDeviceFiles final {
   public:
     explicit ScopedDeviceFiles(DeviceFileSystem& fileSystem);

@@ -1,0 +1,30 @@
+#pragma once
+
+#include <array>
+
+namespace CLI {
+class App;
+}
+
+namespace Varnholt::Cli {
+
+class Session;
+
+/// Each adds one command, or a group of them, to the command line; the file of that name holds it.
+void AddList(CLI::App& app, Session& session);
+void AddReadout(CLI::App& app, Session& session);
+void AddScan(CLI::App& app, Session& session);
+void AddIdentify(CLI::App& app, Session& session);
+void AddReset(CLI::App& app, Session& session);
+void AddMonitor(CLI::App& app, Session& session);
+void AddWriteImage(CLI::App& app, Session& session);
+
+using AddCommand = void (*)(CLI::App& app, Session& session);
+
+/// The commands in the order in which the help lists them.
+inline constexpr std::array Commands{
+    AddCommand{AddList},  AddCommand{AddReadout}, AddCommand{AddScan},       AddCommand{AddIdentify},
+    AddCommand{AddReset}, AddCommand{AddMonitor}, AddCommand{AddWriteImage},
+};
+
+}  // namespace Varnholt::Cli

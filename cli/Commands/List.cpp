@@ -1,0 +1,42 @@
+#include "Commands/CommandLine.h"
+#include "Commands/Commands.h"
+#include "Output/Table.h"
+#include "Utilities/Tools/Win32/SystemHelperWin.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+struct Options {
+    InstrumentOptions instrument;
+    bool json = false;
+};
+
+void List(Session& session, const Options& options) {
+    session.UseTransport(options.instrument.transport);
+    const std::string transport = Utilities::Tools::Is64BitOS() ? "usbio" : "native";
+    const std::vector<std::string> connected = ConnectedInstruments();
+    Json instruments = Json::array();
+    Table table({{"NAME"}, {"IDENTIFIER"}});
+    for (const std::string& identifier : connected) {
+        instruments.push_back({{"identifier", identifier}, {"name", ShortNameOf(identifier)}});
+        table.AddRow({ShortNameOf(identifier), identifier});
+    }
+    if (options.json) {
+        session.Print({{"transport", transport}, {"instruments", instruments}});
+    } else if (!connected.empty()) {
+        table.Print(session.Out());
+    }
+    FindInstrument(connected, {});  // says what to do when there is none
+}
+
+}  // namespace
+
+void AddList(CLI::App& app, Session& session) {
+    const auto options = std::make_shared<Options>();
+    CLI::App* const command = app.add_subcommand("list", "list the instruments that are connected");
+    AddTransportOption(command, options->instrument);
+    AddJsonFlag(command, options->json);
+    SetAction(command, session, options, List);
+}
+
+}  // namespace Varnholt::Cli

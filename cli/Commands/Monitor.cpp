@@ -1,0 +1,86 @@
+#include <fmt/format.h>
+
+#include <deque>
+#include <utility>
+
+#include "Commands/CommandLine.h"
+#include "Commands/Commands.h"
+#include "Platform/Time.h"
+#include "Platform/WaitableObjects.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+struct Options {
+    InstrumentOptions instrument;
+    double seconds = 0;
+    bool json = false;
+};
+
+/// Takes messages on the instrument's thread and hands them to the command's.
+class Mailbox final : public DeviceDriver::Generic::EventListener {
+  public:
+    struct Message {
+        std::uint32_t code;
+        std::uint32_t tick;
+    };
+
+    void MessageFromDevice(std::uint32_t code, std::uint32_t) override {
+        const Platform::CriticalSection::Holder holder(section);
+        waiting.push_back({code, Platform::TickCount()});
+    }
+    std::deque<Message> Take() {
+        const Platform::CriticalSection::Holder holder(section);
+        return std::exchange(waiting, {});
+    }
+
+  private:
+    Platform::CriticalSection section;  ///< guards `waiting`
+    std::deque<Message> waiting;
+};
+
+constexpr std::uint32_t LookInterval = 20;  // milliseconds
+
+void Monitor(Session& session, const Options& options) {
+    Mailbox mailbox;
+    Instrument instrument(session, options.instrument, Instrument::Choice::FirstWillDo, &mailbox);
+    // There is nothing to cut off, and aborted pipes would look like an instrument that is gone.
+    const Interruption::Deferral deferral(session.UserInterruption());
+    const std::uint32_t start = Platform::TickCount();
+    session.Note("watching " + instrument.Identifier() + "; Ctrl-C ends");
+    for (bool isGone = false; !isGone;) {
+        for (const Mailbox::Message& message : mailbox.Take()) {
+            const bool isButton = message.code == DeviceDriver::Generic::MessageButtonData;
+            isGone = isGone || message.code == DeviceDriver::Generic::MessageDeviceGone;
+            const double seconds = (message.tick - start) / 1000.0;
+            const char* const event = isButton ? "button" : isGone ? "removed" : "unknown";
+            if (options.json) {
+                session.Print({{"seconds", seconds}, {"event", event}, {"code", message.code}});
+            } else {
+                session.Out() << fmt::format("{:9.3f} s  {}\n", seconds, event);
+            }
+            session.Out().flush();
+        }
+        const std::uint32_t elapsed = Platform::TickCount() - start;
+        const bool isOver = options.seconds > 0 && elapsed >= options.seconds * 1000;
+        if (isOver || !session.UserInterruption().Sleep(LookInterval)) {
+            break;
+        }
+    }
+}
+
+}  // namespace
+
+void AddMonitor(CLI::App& app, Session& session) {
+    const auto options = std::make_shared<Options>();
+    CLI::App* const command = app.add_subcommand(
+        "monitor", "print a line each time that the button is pressed, and when the instrument is removed");
+    command->add_option("--for", options->seconds, "end after this many seconds (default: with Ctrl-C)")
+        ->type_name("SECONDS")
+        ->check(Silent(CLI::Range(0.0, 1e6)));
+    AddInstrumentOptions(command, options->instrument);
+    AddJsonFlag(command, options->json);
+    SetAction(command, session, options, Monitor);
+}
+
+}  // namespace Varnholt::Cli

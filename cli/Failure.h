@@ -1,0 +1,42 @@
+#pragma once
+
+#include <cstdint>
+#include <exception>
+#include <optional>
+#include <stdexcept>
+#include <string>
+
+#include "ExitCode.h"
+
+namespace Varnholt::Cli {
+
+/// A failure that the tool itself finds: what went wrong, naming the thing, and the way out where there is
+/// one (may be empty).
+class ToolFailure final : public std::runtime_error {
+  public:
+    ToolFailure(ExitCode exitCode, const std::string& message, std::string wayOut = {})
+        : std::runtime_error(message), code(exitCode), advice(std::move(wayOut)) {}
+
+    ExitCode Code() const { return code; }
+    const std::string& Advice() const { return advice; }
+
+  private:
+    ExitCode code;
+    std::string advice;
+};
+
+/// A failure as the user reads it.
+struct FailureReport {
+    ExitCode code;
+    std::string message;
+    std::string advice;
+};
+
+/// Sorts any exception, the library's or the tool's, into its class of failure.
+FailureReport Describe(const std::exception_ptr& failure);
+
+/// The operating system's or driver's code that the text of a library exception ends with: both transports
+/// put it there in a fixed form.
+std::optional<std::uint32_t> SystemCodeIn(const std::string& text);
+
+}  // namespace Varnholt::Cli

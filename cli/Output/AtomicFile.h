@@ -1,0 +1,43 @@
+#pragma once
+
+#include <cstdint>
+#include <filesystem>
+#include <fstream>
+#include <span>
+#include <string>
+
+namespace Varnholt::Cli {
+
+/// A file that takes its name only when it is complete: until `Commit` the content is in a file beside it,
+/// which is gone if that never comes. What had the name before stays whole till then. A name that is no
+/// ordinary file (a device, a pipe) is written to directly.
+///
+/// Failures are `ToolFailure` with `ExitCode::File`.
+class AtomicFile final {
+  public:
+    enum class IfItExists { Replace, Refuse };
+
+    explicit AtomicFile(const std::string& name, IfItExists policy = IfItExists::Replace);
+    ~AtomicFile();
+    AtomicFile(const AtomicFile&) = delete;
+    AtomicFile& operator=(const AtomicFile&) = delete;
+
+    std::ostream& Stream() { return stream; }
+    /// Returns when the content is on the disk under its name.
+    void Commit();
+
+  private:
+    [[noreturn]] void Fail(const std::string& what) const;
+
+    const std::string shownName;
+    const IfItExists ifItExists;
+    std::filesystem::path target;
+    std::filesystem::path partial;  ///< empty: written directly
+    std::ofstream stream;
+    bool committed = false;
+};
+
+void WriteFileAtomically(const std::string& name, std::span<const std::uint8_t> content,
+                         AtomicFile::IfItExists policy = AtomicFile::IfItExists::Replace);
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,93 @@
+#include "Session.h"
+
+#include <algorithm>
+#include <ostream>
+
+#include "Instrument.h"
+#include "Platform/HostQueries.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+constexpr const char* Red = "1;31";
+constexpr const char* Yellow = "1;33";
+constexpr const char* Name = "ostra: ";
+constexpr const char* AdviceIndent = "       ";
+constexpr int WidestPlot = 120;
+
+}  // namespace
+
+Session::Session(Surroundings& surroundings, Interruption& userInterruption)
+    : where(surroundings),
+      interruption(userInterruption),
+      files(Platform::DeviceFiles()),
+      filesInForce(files),
+      transportBefore(Platform::Overridden64BitHost()) {
+    interruption.SetAction([this] { files.Interrupt(); });
+}
+
+Session::~Session() {
+    interruption.SetAction({});
+    Platform::Override64BitHost(transportBefore);
+}
+
+std::string Session::Paint(const char* color, const std::string& text) const {
+    return where.errFacts.showsColor ? "\x1b[" + std::string(color) + "m" + text + "\x1b[0m" : text;
+}
+
+void Session::Note(const std::string& text) {
+    where.err << Name << text << '\n';
+}
+
+void Session::Warn(const std::string& text) {
+    where.err << Paint(Yellow, Name) << text << '\n';
+}
+
+void Session::Report(const FailureReport& report) {
+    where.err << Paint(Red, Name) << report.message << '\n';
+    if (!report.advice.empty()) {
+        where.err << AdviceIndent << report.advice << '\n';
+    }
+}
+
+Progress Session::MakeProgress(const std::string& title, std::uint64_t total, const std::string& unit) {
+    return {where.err, where.errFacts.isTerminal, title, total, unit};
+}
+
+PlotStyle Session::StyleOfPlots() const {
+    PlotStyle style;
+    style.braille = where.outFacts.showsUtf8;
+    style.width = std::min(where.outFacts.columns - 1, WidestPlot);
+    return style;
+}
+
+void Session::UseTransport(const std::string& transport) {
+    if (!transport.empty()) {
+        Platform::Override64BitHost(transport == "usbio");
+    }
+}
+
+FailureReport Session::Explain(const std::exception_ptr& failure) const {
+    FailureReport report = Describe(failure);
+    bool isOwn = false;
+    try {
+        std::rethrow_exception(failure);
+    } catch (const ToolFailure&) {
+        isOwn = true;
+    } catch (...) {  // the library's: its text says nothing of which instrument
+    }
+    if (!isOwn && interruption.IsRequested()) {
+        return {ExitCode::Interrupted, "interrupted", {}};
+    }
+    if (isOwn || instrumentInUse.empty()) {
+        return report;
+    }
+    if (report.code == ExitCode::InputOutput && !IsConnected(instrumentInUse)) {
+        report = {ExitCode::NoInstrument, "unplugged (" + report.message + ")",
+                  "plug it in again; `ostra list` shows whether it is found"};
+    }
+    report.message = instrumentInUse + ": " + report.message;
+    return report;
+}
+
+}  // namespace Varnholt::Cli

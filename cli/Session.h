@@ -1,0 +1,70 @@
+#pragma once
+
+#include <functional>
+#include <iosfwd>
+#include <string>
+
+#include "Failure.h"
+#include "Interruption.h"
+#include "Output/Json.h"
+#include "Output/Plot.h"
+#include "Output/Progress.h"
+#include "Platform/InterruptibleDeviceFiles.h"
+#include "Terminal.h"
+
+namespace Varnholt::Cli {
+
+/// Where a run of the tool reads and writes. Results go to `out`, everything else to `err`.
+struct Surroundings {
+    std::ostream& out;
+    std::ostream& err;
+    StreamFacts outFacts;
+    StreamFacts errFacts;
+};
+
+/// One run of the tool, as its commands see it. Its device files are in force for its life.
+class Session final {
+  public:
+    /// References must outlive the session.
+    Session(Surroundings& surroundings, Interruption& userInterruption);
+    ~Session();
+    Session(const Session&) = delete;
+    Session& operator=(const Session&) = delete;
+
+    std::ostream& Out() { return where.out; }
+    const StreamFacts& OutFacts() const { return where.outFacts; }
+    void Print(const Json& value) { PrintJson(where.out, value); }
+
+    /// Messages, on standard error.
+    void Note(const std::string& text);
+    void Warn(const std::string& text);
+    void Report(const FailureReport& report);
+    Progress MakeProgress(const std::string& title, std::uint64_t total, const std::string& unit);
+
+    PlotStyle StyleOfPlots() const;
+
+    Interruption& UserInterruption() { return interruption; }
+    Platform::InterruptibleDeviceFiles& Files() { return files; }
+
+    /// "native", "usbio", or empty: what the platform prefers.
+    void UseTransport(const std::string& transport);
+
+    /// Sorts the failure of a command, with what is known of the instrument that it worked on.
+    FailureReport Explain(const std::exception_ptr& failure) const;
+    void SetInstrumentInUse(const std::string& identifier) { instrumentInUse = identifier; }
+
+    /// What the command line asks for; carried out when it has been understood as a whole.
+    std::function<void()> action;
+
+  private:
+    std::string Paint(const char* color, const std::string& text) const;
+
+    Surroundings& where;
+    Interruption& interruption;
+    Platform::InterruptibleDeviceFiles files;
+    const Platform::ScopedDeviceFiles filesInForce;
+    const std::optional<bool> transportBefore;
+    std::string instrumentInUse;
+};
+
+}  // namespace Varnholt::Cli

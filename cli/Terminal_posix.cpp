@@ -1,0 +1,123 @@
+#include <fcntl.h>
+#include <pthread.h>
+#include <signal.h>
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <atomic>
+#include <cstdlib>
+#include <string_view>
+#include <thread>
+
+#include "ExitCode.h"
+#include "Terminal.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+std::string_view Environment(const char* name) {
+    const char* const value = std::getenv(name);
+    return value != nullptr ? value : "";
+}
+
+/// The variables that decide about characters, in their order of precedence; no locale is loaded.
+bool EnvironmentSaysUtf8() {
+    for (const char* name : {"LC_ALL", "LC_CTYPE", "LANG"}) {
+        std::string value(Environment(name));
+        if (value.empty()) {
+            continue;
+        }
+        std::transform(value.begin(), value.end(), value.begin(),
+                       [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; });
+        return value.find("utf-8") != std::string::npos || value.find("utf8") != std::string::npos;
+    }
+    return false;
+}
+
+StreamFacts FactsOf(int descriptor) {
+    StreamFacts facts;
+    facts.isTerminal = ::isatty(descriptor) != 0;
+    facts.showsColor = facts.isTerminal && Environment("NO_COLOR").empty() && Environment("TERM") != "dumb";
+    facts.showsUtf8 = EnvironmentSaysUtf8();
+    winsize size{};
+    if (facts.isTerminal && ::ioctl(descriptor, TIOCGWINSZ, &size) == 0 && size.ws_col > 0) {
+        facts.columns = size.ws_col;
+    }
+    return facts;
+}
+
+sigset_t WatchedSignals() {
+    sigset_t signals;
+    sigemptyset(&signals);
+    for (const int number : {SIGINT, SIGTERM, SIGHUP}) {
+        sigaddset(&signals, number);
+    }
+    return signals;
+}
+
+}  // namespace
+
+StreamFacts FactsOfStandardOutput() {
+    return FactsOf(STDOUT_FILENO);
+}
+
+StreamFacts FactsOfStandardError() {
+    return FactsOf(STDERR_FILENO);
+}
+
+void SetStandardOutputBinary() {}
+
+bool SyncToDisk(const std::string& path) {
+    const int file = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    if (file < 0) {
+        return false;
+    }
+    const bool synced = ::fsync(file) == 0;
+    ::close(file);
+    return synced;
+}
+
+/// The signals are blocked in every thread and taken by one that waits for them: what it then calls may take
+/// locks, which a signal handler may not.
+struct SignalWatch::State {
+    explicit State(std::function<void()> whenAsked) : callback(std::move(whenAsked)) {
+        const sigset_t signals = WatchedSignals();
+        ::pthread_sigmask(SIG_BLOCK, &signals, &maskBefore);
+        thread = std::thread([this] { Run(); });
+    }
+
+    void Run() {
+        const sigset_t signals = WatchedSignals();
+        for (bool isFirst = true;; isFirst = false) {
+            int number = 0;
+            if (::sigwait(&signals, &number) != 0) {
+                return;
+            }
+            if (ending) {
+                return;
+            }
+            if (!isFirst) {
+                ::_exit(static_cast<int>(ExitCode::Interrupted));
+            }
+            callback();
+        }
+    }
+
+    const std::function<void()> callback;
+    std::atomic<bool> ending{false};
+    sigset_t maskBefore{};
+    std::thread thread;
+};
+
+SignalWatch::SignalWatch(std::function<void()> whenAsked) : state(new State(std::move(whenAsked))) {}
+
+SignalWatch::~SignalWatch() {
+    state->ending = true;
+    ::pthread_kill(state->thread.native_handle(), SIGTERM);
+    state->thread.join();
+    ::pthread_sigmask(SIG_SETMASK, &state->maskBefore, nullptr);
+    delete state;
+}
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,89 @@
+#include <fcntl.h>
+#include <io.h>
+#include <windows.h>
+
+#include <atomic>
+#include <cstdio>
+#include <cstdlib>
+
+#include "ExitCode.h"
+#include "Terminal.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+StreamFacts FactsOf(DWORD which) {
+    StreamFacts facts;
+    const HANDLE stream = ::GetStdHandle(which);
+    DWORD mode = 0;
+    facts.isTerminal = ::GetConsoleMode(stream, &mode) != 0;
+    // Colours need a console that understands escape sequences (0x0004), which old ones do not.
+    constexpr DWORD escapeSequences = 0x0004;
+    const char* const noColor = std::getenv("NO_COLOR");
+    facts.showsColor = facts.isTerminal && (noColor == nullptr || *noColor == '\0') &&
+                       ::SetConsoleMode(stream, mode | escapeSequences) != 0;
+    facts.showsUtf8 = ::GetConsoleOutputCP() == CP_UTF8;
+    CONSOLE_SCREEN_BUFFER_INFO info{};
+    if (facts.isTerminal && ::GetConsoleScreenBufferInfo(stream, &info) != 0) {
+        facts.columns = info.srWindow.Right - info.srWindow.Left + 1;
+    }
+    return facts;
+}
+
+}  // namespace
+
+StreamFacts FactsOfStandardOutput() {
+    return FactsOf(STD_OUTPUT_HANDLE);
+}
+
+StreamFacts FactsOfStandardError() {
+    return FactsOf(STD_ERROR_HANDLE);
+}
+
+void SetStandardOutputBinary() {
+    ::_setmode(::_fileno(stdout), _O_BINARY);
+}
+
+bool SyncToDisk(const std::string& path) {
+    const HANDLE file = ::CreateFileA(path.c_str(), GENERIC_WRITE, FILE_SHARE_READ | FILE_SHARE_WRITE,
+                                      nullptr, OPEN_EXISTING, 0, nullptr);
+    if (file == INVALID_HANDLE_VALUE) {
+        return false;
+    }
+    const bool synced = ::FlushFileBuffers(file) != 0;
+    ::CloseHandle(file);
+    return synced;
+}
+
+/// The console calls its handler on a thread of its own.
+struct SignalWatch::State {
+    std::function<void()> callback;
+    std::atomic<bool> asked{false};
+
+    static State* current;
+    static BOOL WINAPI Handle(DWORD) {
+        if (current == nullptr) {
+            return FALSE;
+        }
+        if (current->asked.exchange(true)) {
+            ::ExitProcess(static_cast<UINT>(ExitCode::Interrupted));
+        }
+        current->callback();
+        return TRUE;
+    }
+};
+SignalWatch::State* SignalWatch::State::current = nullptr;
+
+SignalWatch::SignalWatch(std::function<void()> whenAsked) : state(new State) {
+    state->callback = std::move(whenAsked);
+    State::current = state;
+    ::SetConsoleCtrlHandler(&State::Handle, TRUE);
+}
+
+SignalWatch::~SignalWatch() {
+    ::SetConsoleCtrlHandler(&State::Handle, FALSE);
+    State::current = nullptr;
+    delete state;
+}
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,88 @@
+#include "Tool.h"
+
+#include <algorithm>
+#include <CLI/CLI.hpp>
+#include <ostream>
+
+#include "Commands/Commands.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+constexpr const char* Description = "ostra: the command line of a USB hand-held optical measuring instrument";
+
+constexpr const char* Footer = R"(
+`ostra COMMAND --help` tells more of a command.
+
+Exit codes:
+    0  success
+    1  a failure that none of the others names
+    2  the command line cannot be understood
+    3  no instrument, not the one that was named, or it was unplugged
+    4  the instrument is used by another process, or there is no permission
+    5  a transfer failed
+    6  the instrument did not answer in time
+    7  data or values that cannot be used (an image, a table, an integration time)
+    8  a file cannot be read or written
+    9  the images that were compared differ
+  130  interrupted (Ctrl-C)
+)";
+
+void BuildCommandLine(CLI::App& app, Session& session) {
+    app.require_subcommand(1);
+    app.set_version_flag("--version", "ostra " OSTRA_VERSION, "print the version");
+    app.set_help_flag("-h,--help", "print this help");
+    for (const AddCommand add : Commands) {
+        add(app, session);
+    }
+    app.footer(Footer);  // after the commands, which would inherit it
+}
+
+/// The command line as CLI11 wants it: the last argument first.
+std::vector<std::string> Reversed(std::vector<std::string> arguments) {
+    std::reverse(arguments.begin(), arguments.end());
+    return arguments;
+}
+
+ExitCode Run(const std::vector<std::string>& arguments, Surroundings& surroundings, Session& session) {
+    CLI::App app(Description, "ostra");
+    BuildCommandLine(app, session);
+    if (arguments.empty()) {
+        surroundings.err << app.help();
+        return ExitCode::Usage;
+    }
+    try {
+        app.parse(Reversed(arguments));
+    } catch (const CLI::ParseError& error) {
+        const bool isHelp = error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success);
+        if (isHelp) {
+            app.exit(error, surroundings.out, surroundings.err);
+            return ExitCode::Success;
+        }
+        session.Report(
+            {ExitCode::Usage, error.what(), "`ostra --help` and `ostra COMMAND --help` tell more"});
+        return ExitCode::Usage;
+    }
+    session.action();
+    surroundings.out.flush();
+    if (!surroundings.out) {
+        throw ToolFailure(ExitCode::File, "the output cannot be written");
+    }
+    return ExitCode::Success;
+}
+
+}  // namespace
+
+ExitCode RunTool(const std::vector<std::string>& arguments, Surroundings& surroundings,
+                 Interruption& interruption) {
+    Session session(surroundings, interruption);
+    try {
+        return Run(arguments, surroundings, session);
+    } catch (...) {
+        const FailureReport report = session.Explain(std::current_exception());
+        session.Report(report);
+        return report.code;
+    }
+}
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,80 @@
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "Platform/DeviceFiles.h"
+#include "Platform/WaitableObjects.h"
+
+namespace Varnholt::Platform {
+
+/// Device files that another thread can interrupt: what lets a program end a scan, which otherwise returns
+/// only when the instrument says so. Put in force with `ScopedDeviceFiles`; everything passes through to
+/// `below`.
+///
+/// An interruption asks the driver to abort the pipes on which transfers run, in the driver's own way: the
+/// USBIO driver through the pipe's file, the instrument's own driver through the device's. What waits for the
+/// transfers sees them fail and unwinds as after any other failure. The files stay open.
+class InterruptibleDeviceFiles final : public DeviceFileSystem {
+  public:
+    /// `underlying` must outlive the object.
+    explicit InterruptibleDeviceFiles(DeviceFileSystem& underlying);
+    InterruptibleDeviceFiles(const InterruptibleDeviceFiles&) = delete;
+    InterruptibleDeviceFiles& operator=(const InterruptibleDeviceFiles&) = delete;
+
+    /// Ends the reads and writes that run, and refuses new transfers and controls with
+    /// `Errors::OperationAborted` until `Resume`. Returns within 2 s for each pipe. Any thread.
+    void Interrupt();
+    /// Transfers may start again.
+    void Resume();
+    bool IsInterrupted() const { return interrupted.load(); }
+
+    /// Called on the calling thread, for each read of that thread that brought data, with the number of
+    /// bytes. An empty function ends that. Not while reads of the thread run.
+    using ReadObserver = std::function<void(std::uint32_t bytes)>;
+    void ObserveReads(ReadObserver observer);
+
+    std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
+    Handle Open(const std::string& path) override;
+    bool CloseFile(Handle file) override;
+    bool StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) override;
+    bool StartWrite(Handle file, const void* buffer, std::uint32_t length, Overlapped& record) override;
+    bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
+                      void* output, std::uint32_t outputSize, Overlapped& record) override;
+    bool GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) override;
+    bool CancelTransfers(Handle file) override;
+
+  private:
+    struct OpenedFile {
+        Handle handle;
+        std::string path;
+    };
+    struct RunningTransfer {
+        const Overlapped* record;
+        Handle file;
+        bool isRead;
+        std::thread::id starter;
+    };
+
+    template <class Start>
+    bool StartTransfer(Handle file, Overlapped& record, bool isRead, Start start);
+    bool Refuse(Overlapped& record) const;
+    void AbortPipe(Handle file);
+    void Control(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize);
+    const std::string& PathOf(Handle file) const;
+
+    DeviceFileSystem& below;
+    std::atomic<bool> interrupted{false};
+    /// Guards what follows, and keeps files from being closed while their pipes are aborted.
+    CriticalSection section;
+    std::vector<OpenedFile> files;
+    std::vector<RunningTransfer> running;
+    ReadObserver observer;
+    std::thread::id observed;
+};
+
+}  // namespace Varnholt::Platform
