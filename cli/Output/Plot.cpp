@@ -110,7 +110,7 @@ std::string BrailleCell(const Raster& raster, int column, int row) {
 }
 
 std::string Label(double value) {
-    return fmt::format("{:.6g}", value);
+    return fmt::format("{:.5g}", value);
 }
 
 }  // namespace
@@ -129,8 +129,10 @@ void PrintPlot(std::ostream& stream, std::span<const double> values, const PlotS
     scale.Settle();
     const int height = std::max(style.height, 2);
     const std::string top = Label(scale.high);
-    const std::string middle =
-        Label(scale.low + (scale.high - scale.low) * (height - 0.5 - height / 2) / height);
+    const int dotRows = height * (style.braille ? DotRows : 1);
+    const int middleRow = height - 1 - height / 2;
+    const double middleDot = middleRow * (style.braille ? DotRows : 1) + (style.braille ? DotRows - 1 : 0) / 2.0;
+    const std::string middle = Label(scale.low + (scale.high - scale.low) * middleDot / (dotRows - 1));
     const std::string bottom = Label(scale.low);
     const auto labelWidth = static_cast<int>(std::max({top.size(), middle.size(), bottom.size()}));
     const int room = std::max(style.width - static_cast<int>(style.indent.size()) - labelWidth - 2, 8);
@@ -139,7 +141,7 @@ void PrintPlot(std::ostream& stream, std::span<const double> values, const PlotS
     const int width = std::clamp((count + perCell - 1) / perCell, 1, room);
 
     const int dotColumns = std::max(std::min(width * perCell, count), 1);
-    const Raster raster = Draw(values, scale, dotColumns, height * (style.braille ? DotRows : 1));
+    const Raster raster = Draw(values, scale, dotColumns, dotRows);
     for (int line = 0; line < height; ++line) {
         const bool isLabelled = line == 0 || line == height - 1 || line == height / 2;
         const std::string& label = line == 0 ? top : line == height - 1 ? bottom : middle;

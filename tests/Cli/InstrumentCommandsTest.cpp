@@ -1,0 +1,297 @@
+#include "Interface/Readout.h"
+#include "ToolFixture.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using Cli::ExitCode;
+using Simulator::InstrumentSettings;
+
+InstrumentSettings Leisurely() {
+    InstrumentSettings settings;
+    settings.takesIntegrationTime = true;
+    return settings;
+}
+
+class InstrumentCommandsTest : public ToolTest {};
+OSTRA_ON_BOTH_TRANSPORTS(InstrumentCommandsTest);
+
+TEST_P(InstrumentCommandsTest, List) {
+    EXPECT_EQ(tool.Run({"list"}), ExitCode::NoInstrument);
+    EXPECT_EQ(tool.Out(), "");
+    EXPECT_NE(tool.Err().find("no instrument is connected"), std::string::npos) << tool.Err();
+    EXPECT_EQ(tool.Run({"list", "--json"}), ExitCode::NoInstrument);
+    EXPECT_EQ(tool.Json()["instruments"].size(), 0u);
+
+    host.Add("sim-b");
+    host.Add("sim-a");
+    Succeed({"list"});
+    EXPECT_EQ(tool.Out(),
+              "NAME   IDENTIFIER\nsim-a  " + Identifier("sim-a") + "\nsim-b  " + Identifier("sim-b") + "\n");
+    EXPECT_EQ(tool.Err(), "");
+    Succeed({"list", "--json"});
+    EXPECT_EQ(tool.Out(), std::string("{\"transport\":\"") + Name(GetParam()) +
+                              "\",\"instruments\":[{\"identifier\":\"" + Identifier("sim-a") +
+                              "\",\"name\":\"sim-a\"},{\"identifier\":\"" + Identifier("sim-b") +
+                              "\",\"name\":\"sim-b\"}]}\n");
+}
+
+TEST_P(InstrumentCommandsTest, TheTransportCanBeChosenAndIsGivenBack) {
+    host.Add("sim");
+    const Transport other = GetParam() == Transport::Native ? Transport::UsbIo : Transport::Native;
+    Succeed({"identify", "--transport", Name(other), "--json"});
+    EXPECT_EQ(tool.Json()["identifier"], std::string(Name(other)) + "/sim");
+    Succeed({"identify", "--json"});
+    EXPECT_EQ(tool.Json()["identifier"], Identifier());
+}
+
+TEST_P(InstrumentCommandsTest, ReadoutSendsTheFixedParameters) {
+    auto& instrument = host.Add("sim");
+    Succeed({"readout", "--json"});
+    EXPECT_EQ(tool.Json()["identifier"], Identifier());
+    EXPECT_EQ(tool.Json()["values"].size(), 128u);
+    instrument.WithCommands([](const Simulator::Commands& commands) {
+        EXPECT_EQ(commands.parameters, (Simulator::MeasureParameters{294, 0, 1, 6}));
+        EXPECT_EQ(commands.resets, 1u);
+    });
+}
+
+/// All forms of one readout hold the same values.
+TEST_P(InstrumentCommandsTest, ReadoutForms) {
+    host.Add("sim", Leisurely());
+    Succeed({"readout", "--raw", "--output", folder.Path("raw")});
+    const auto bytes = ReadFile(folder.Path("raw"));
+    ASSERT_EQ(bytes.size(), 256u);
+    host.Add("sim");  // the same noise once more for each
+    Succeed({"readout", "--json"});
+    const std::vector<int> values = tool.Json()["values"];
+    const auto expected = Interface::ReadoutFromBytes(std::span<const std::uint8_t, 256>(bytes.data(), 256));
+    EXPECT_TRUE(std::equal(values.begin(), values.end(), expected.begin()));
+
+    host.Add("sim");
+    Succeed({"readout", "--csv"});
+    std::string csv = "1,0.000";
+    for (const int value : values) {
+        csv += "," + std::to_string(value);
+    }
+    ASSERT_EQ(tool.Lines().size(), 2u);
+    EXPECT_TRUE(tool.Lines()[0].starts_with("readout,seconds,0,1,2,"));
+    EXPECT_EQ(tool.Lines()[1], csv);
+
+    host.Add("sim");
+    Succeed({"readout"});
+    ASSERT_EQ(tool.Lines().size(), 17u);
+    std::vector<int> printed;
+    for (std::size_t row = 0; row < 16; ++row) {
+        std::istringstream line(tool.Lines()[row]);
+        std::string index;
+        line >> index;
+        EXPECT_EQ(index, std::to_string(row * 8) + ":");
+        for (int value = 0; line >> value;) {
+            printed.push_back(value);
+        }
+    }
+    EXPECT_EQ(printed, values);
+}
+
+TEST_P(InstrumentCommandsTest, ReadoutPlotsInTheCharactersOfTheTerminal) {
+    host.Add("sim");
+    Succeed({"readout", "--plot"});
+    EXPECT_NE(tool.Out().find('*'), std::string::npos);
+    EXPECT_EQ(tool.Out().find("\xE2\xA0"), std::string::npos);
+    tool.outFacts.showsUtf8 = true;
+    Succeed({"readout", "--plot"});
+    EXPECT_EQ(tool.Out().find('*'), std::string::npos);
+    EXPECT_NE(tool.Out().find("\xE2\xA0"), std::string::npos);
+    Succeed({"readout", "--plot", "--ascii"});
+    EXPECT_EQ(tool.Out().find("\xE2\xA0"), std::string::npos);
+}
+
+TEST_P(InstrumentCommandsTest, ReadoutRepeatsFromStartToStart) {
+    host.Add("sim", Leisurely());
+    Succeed({"readout", "--json", "--repeat", "3", "--interval", "2"});
+    ASSERT_EQ(tool.Lines().size(), 3u);
+    for (int i = 0; i < 3; ++i) {
+        const auto line = nlohmann::json::parse(tool.Lines()[static_cast<std::size_t>(i)]);
+        EXPECT_EQ(line["readout"], i + 1);
+        EXPECT_NEAR(line["seconds"], 2.0 * i, 0.01);
+    }
+}
+
+TEST_P(InstrumentCommandsTest, ReadoutWithAnIntegrationTimeChoosesTheMode) {
+    auto& instrument = host.Add("sim");
+    Succeed({"readout", "--integration-time", "0.5"});
+    instrument.WithCommands([](const Simulator::Commands& commands) {
+        EXPECT_EQ(commands.mode, 1);
+        EXPECT_EQ(commands.parameters, (Simulator::MeasureParameters{7353, 0, 1, 6}));  // of 68 us
+    });
+    Succeed({"readout", "--integration-time", "0.005"});
+    instrument.WithCommands([](const Simulator::Commands& commands) {
+        EXPECT_EQ(commands.mode, 2);
+        EXPECT_EQ(commands.parameters.p1, 147);  // of 34 us
+    });
+    EXPECT_EQ(tool.Run({"readout", "--integration-time", "60"}), ExitCode::BadData);
+    EXPECT_NE(tool.Err().find("Integration time too high"), std::string::npos) << tool.Err();
+    EXPECT_NE(tool.Err().find("mode 2: 0.00442 s to 2.22819 s"), std::string::npos) << tool.Err();
+    instrument.WithCommands([](const Simulator::Commands& commands) { EXPECT_EQ(commands.mode, 2); });
+}
+
+TEST_P(InstrumentCommandsTest, Identify) {
+    InstrumentSettings settings;
+    settings.firmware = 305;
+    host.Add("sim", settings);
+    Succeed({"identify", "--json"});
+    const auto found = tool.Json();
+    EXPECT_EQ(found["identifier"], Identifier());
+    EXPECT_EQ(found["name"], "sim");
+    EXPECT_EQ(found["chipId"], "5a0123456789abcd");
+    EXPECT_EQ(found["misc"], (nlohmann::json{0x21, 305, 0x43, 0x0506, 0x0708}));
+    EXPECT_EQ(found["mode"][0], 3);
+    EXPECT_EQ(found["parameters"][4], 0x55);
+    Succeed({"identify"});
+    EXPECT_NE(tool.Out().find("5a0123456789abcd"), std::string::npos);
+}
+
+TEST_P(InstrumentCommandsTest, ResetSendsItsCodeAfterTheOneOfTheOpening) {
+    auto& instrument = host.Add("sim");
+    Succeed({"reset", "--code", "7"});
+    instrument.WithCommands([](const Simulator::Commands& commands) {
+        EXPECT_EQ(commands.lastResetCode, 7);
+        EXPECT_EQ(commands.resets, 2u);
+    });
+    EXPECT_EQ(tool.Run({"reset", "--code", "256"}), ExitCode::Usage);
+}
+
+TEST_P(InstrumentCommandsTest, MonitorReportsButtonAndRemoval) {
+    auto& instrument = host.Add("sim");
+    auto& scheduler = Platform::ClockScheduler();
+    scheduler.CallAt(scheduler.Now() + 1'000'000, [&] { instrument.PressButton(); });
+    scheduler.CallAt(scheduler.Now() + 2'000'000, [&] { host.Bus().Unplug("sim"); });
+    Succeed({"monitor", "--json"});
+    ASSERT_EQ(tool.Lines().size(), 2u) << tool.Out();
+    const auto button = nlohmann::json::parse(tool.Lines()[0]);
+    EXPECT_EQ(button["event"], "button");
+    EXPECT_NEAR(button["seconds"], 1.0, 0.05);
+    EXPECT_EQ(nlohmann::json::parse(tool.Lines()[1])["event"], "removed");
+}
+
+TEST_P(InstrumentCommandsTest, MonitorEndsInTimeAndWithCtrlC) {
+    host.Add("sim");
+    const Stopwatch watch(clock);
+    Succeed({"monitor", "--for", "3"});
+    watch.ExpectBetween(3000, 3100);
+    EXPECT_EQ(tool.Out(), "");
+    Cli::Interruption interruption;
+    tool.interruption = &interruption;
+    auto& scheduler = Platform::ClockScheduler();
+    scheduler.CallAt(scheduler.Now() + 1'000'000, [&] { interruption.Request(); });
+    Succeed({"monitor"});
+    EXPECT_EQ(tool.Out(), "") << "an end that the user wants is no removal";
+}
+
+TEST_P(InstrumentCommandsTest, WriteImageWritesTheBytesAsTheyAre) {
+    auto& instrument = host.Add("sim");
+    std::vector<std::uint8_t> image(8192);
+    for (std::size_t i = 0; i < image.size(); ++i) {
+        image[i] = static_cast<std::uint8_t>(i * 7 + i / 256);
+    }
+    WriteFile(folder.Path("image"), image);
+    Succeed({"write-image", folder.Path("image")});
+    EXPECT_EQ(instrument.Eeprom(), image);
+    for (const std::size_t size : {0u, 8191u, 8193u}) {
+        WriteFile(folder.Path("wrong"), std::vector<std::uint8_t>(size));
+        EXPECT_EQ(tool.Run({"write-image", folder.Path("wrong")}), ExitCode::BadData) << size;
+        EXPECT_NE(tool.Err().find("instead of 8192"), std::string::npos) << tool.Err();
+    }
+    EXPECT_EQ(tool.Run({"write-image", folder.Path("missing")}), ExitCode::File);
+    EXPECT_EQ(instrument.Eeprom(), image);
+}
+
+TEST_P(InstrumentCommandsTest, WriteImageTellsHowFarItCame) {
+    host.Add("sim");
+    WriteFile(folder.Path("image"), std::vector<std::uint8_t>(8192, 5));
+    host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-out 9:stall"));
+    EXPECT_EQ(tool.Run({"write-image", folder.Path("image")}), ExitCode::InputOutput);
+    EXPECT_NE(tool.Err().find("3 of 32 pieces were written"), std::string::npos) << tool.Err();
+}
+
+TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
+    host.Add("left");
+    host.Add("right");
+    WriteFile(folder.Path("image"), std::vector<std::uint8_t>(8192, 5));
+    EXPECT_EQ(tool.Run({"write-image", folder.Path("image")}), ExitCode::Usage) << "which one?";
+    EXPECT_EQ(tool.Run({"identify", "--device", "up"}), ExitCode::NoInstrument);
+    EXPECT_NE(tool.Err().find(Identifier("right")), std::string::npos) << "names those that there are";
+    Succeed({"identify", "--device", "ight", "--json"});
+    EXPECT_EQ(tool.Json()["name"], "right");
+    EXPECT_EQ(tool.Err(), "");
+    Succeed({"identify", "--json"});
+    EXPECT_EQ(tool.Json()["name"], "left");
+    EXPECT_NE(tool.Err().find("taking " + Identifier("left")), std::string::npos);
+}
+
+TEST_P(InstrumentCommandsTest, FailuresHaveTheirExitCodesAndNameTheInstrument) {
+    struct Case {
+        const char* faults;
+        ExitCode code;
+    };
+    for (const Case& row : {
+             Case{"bulk-in 0:stall", ExitCode::InputOutput},
+             Case{"bulk-in 0+:silent", ExitCode::Timeout},
+             Case{"bulk-in 0:gone-during", ExitCode::NoInstrument},
+             Case{"control 1:stall", ExitCode::InputOutput},
+             Case{"bulk-in 0:gone-before", ExitCode::NoInstrument},
+             Case{"control 1:gone-after", ExitCode::NoInstrument},
+             Case{"control 0:stall", ExitCode::InputOutput},
+         }) {
+        host.Add("sim");
+        host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse(row.faults));
+        EXPECT_EQ(tool.Run({"readout"}), row.code) << row.faults << ": " << tool.Err();
+        EXPECT_NE(tool.Err().find(Identifier()), std::string::npos) << tool.Err();
+        EXPECT_EQ(tool.Out(), "");
+    }
+}
+
+TEST_P(InstrumentCommandsTest, AnInstrumentInUseIsSaidToBe) {
+    auto& instrument = host.Add("sim");
+    ASSERT_EQ(instrument.Claim(), Platform::Errors::Success);
+    EXPECT_EQ(tool.Run({"readout"}), ExitCode::NotAvailable);
+    EXPECT_NE(tool.Err().find(Identifier() + ": the instrument is used by another process"),
+              std::string::npos)
+        << tool.Err();
+    Succeed({"list"});
+    instrument.Release();
+    Succeed({"readout"});
+}
+
+TEST(CommandLineTest, UsageErrorsGoToStandardError) {
+    ToolRunner tool;
+    for (const std::vector<std::string>& arguments : std::vector<std::vector<std::string>>{
+             {},
+             {"no-such-command"},
+             {"readout", "--no-such-option"},
+             {"readout", "extra"},
+             {"readout", "--repeat", "-1"},
+             {"readout", "--parameters", "1,2,3"},
+             {"readout", "--parameters", "1,2,3,256"},
+             {"readout", "--parameters", "1,2,3,4", "--integration-time", "1"},
+             {"readout", "--integration-time", "0"},
+             {"scan", "--record-size", "6554"},
+             {"scan", "--record-size", "0"},
+             {"scan", "--total", "256", "--records", "1"},
+             {"scan", "--json"},
+             {"list", "--transport", "serial"},
+             {"write-image"},
+         }) {
+        EXPECT_EQ(tool.Run(arguments), ExitCode::Usage) << testing::PrintToString(arguments);
+        EXPECT_EQ(tool.Out(), "");
+        EXPECT_NE(tool.Err(), "");
+    }
+    EXPECT_EQ(tool.Run({"--help"}), ExitCode::Success);
+    EXPECT_NE(tool.Out().find("Exit codes:"), std::string::npos);
+    EXPECT_EQ(tool.Run({"--version"}), ExitCode::Success);
+    EXPECT_EQ(tool.Out(), "ostra 1.0.3\n");
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests

@@ -1,0 +1,113 @@
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <nlohmann/json.hpp>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "Support/SimulatedHost.h"
+#include "Support/TestClock.h"
+#include "Tool.h"
+
+namespace Varnholt::Tests {
+
+/// A folder of the test's own, gone with it.
+class TestFolder final {
+  public:
+    TestFolder() {
+        const auto* const test = testing::UnitTest::GetInstance()->current_test_info();
+        std::string name = std::string("ostra-") + test->test_suite_name() + "-" + test->name();
+        std::replace(name.begin(), name.end(), '/', '-');
+        folder = std::filesystem::temp_directory_path() / name;
+        std::filesystem::remove_all(folder);
+        std::filesystem::create_directories(folder);
+    }
+    ~TestFolder() {
+        std::error_code ignored;
+        std::filesystem::remove_all(folder, ignored);
+    }
+    TestFolder(const TestFolder&) = delete;
+    TestFolder& operator=(const TestFolder&) = delete;
+
+    std::string Path(const std::string& name) const { return (folder / name).string(); }
+    /// Names of the files, in order.
+    std::vector<std::string> Files() const {
+        std::vector<std::string> names;
+        for (const auto& entry : std::filesystem::directory_iterator(folder)) {
+            names.push_back(entry.path().filename().string());
+        }
+        std::sort(names.begin(), names.end());
+        return names;
+    }
+
+  private:
+    std::filesystem::path folder;
+};
+
+inline std::vector<std::uint8_t> ReadFile(const std::string& path) {
+    std::ifstream file(path, std::ios::binary);
+    EXPECT_TRUE(file) << path;
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+inline void WriteFile(const std::string& path, const std::vector<std::uint8_t>& content) {
+    std::ofstream file(path, std::ios::binary);
+    file.write(reinterpret_cast<const char*>(content.data()), static_cast<std::streamsize>(content.size()));
+}
+
+/// Runs the tool in this process. The streams say that they are no terminals, unless a test says otherwise.
+class ToolRunner {
+  public:
+    Cli::ExitCode Run(const std::vector<std::string>& arguments) {
+        out.str({});
+        err.str({});
+        Cli::Surroundings surroundings{out, err, outFacts, errFacts};
+        Cli::Interruption none;
+        return Cli::RunTool(arguments, surroundings, interruption != nullptr ? *interruption : none);
+    }
+    std::string Out() const { return out.str(); }
+    std::string Err() const { return err.str(); }
+    nlohmann::json Json() const { return nlohmann::json::parse(out.str()); }
+    std::vector<std::string> Lines() const {
+        std::vector<std::string> lines;
+        std::istringstream stream(out.str());
+        for (std::string line; std::getline(stream, line);) {
+            lines.push_back(line);
+        }
+        return lines;
+    }
+
+    Cli::StreamFacts outFacts, errFacts;
+    Cli::Interruption* interruption = nullptr;
+
+  private:
+    std::ostringstream out, err;
+};
+
+/// The tool on a host with simulated instruments, on both transports, in virtual time.
+class ToolTest : public testing::TestWithParam<Transport> {
+  protected:
+    /// Succeeds, or the test fails with what the tool said.
+    void Succeed(const std::vector<std::string>& arguments) {
+        EXPECT_EQ(tool.Run(arguments), Cli::ExitCode::Success) << tool.Err();
+    }
+    std::string Identifier(const std::string& name = "sim") const { return host.Identifier(name); }
+
+    TestClock clock{TestTime::Virtual};
+    SimulatedHost host{GetParam()};
+    ToolRunner tool;
+    TestFolder folder;
+};
+
+inline std::string NameOfTransport(const testing::TestParamInfo<Transport>& info) {
+    return Name(info.param);
+}
+#define OSTRA_ON_BOTH_TRANSPORTS(Suite) \
+    INSTANTIATE_TEST_SUITE_P(, Suite, testing::Values(Transport::Native, Transport::UsbIo), NameOfTransport)
+
+}  // namespace Varnholt::Tests
