@@ -112,7 +112,12 @@ FailureReport Describe(const std::exception_ptr& failure) {
     } catch (const ToolFailure& exception) {
         return {exception.Code(), exception.what(), exception.Advice()};
     } catch (const TimeoutException& exception) {
-        return {ExitCode::Timeout, WithReason(SilentMessage, Tidy(exception.what())), SilentAdvice};
+        // A transfer that a removed instrument cannot even begin is reported as a wait that failed.
+        FailureReport report = OfTransfer(Tidy(exception.what()));
+        if (report.code == ExitCode::InputOutput) {
+            report = {ExitCode::Timeout, WithReason(SilentMessage, Tidy(exception.what())), SilentAdvice};
+        }
+        return report;
     } catch (const DataException& exception) {
         return {ExitCode::BadData, Tidy(exception.what()), {}};
     } catch (const IOException& exception) {

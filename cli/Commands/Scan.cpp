@@ -153,6 +153,12 @@ void Scan(Session& session, const Options& options) {
 
     RecordWriter writer(file ? file->Stream() : session.Out(), options);
     writer.WriteAll(instrument);
+    if (writer.Bytes() < total) {
+        throw ToolFailure(ExitCode::InputOutput,
+                          fmt::format("{}: the instrument stopped after {} of {} bytes",
+                                      instrument.Identifier(), writer.Bytes(), total),
+                          "a smaller --total, or none: then the scan is as long as the instrument makes it");
+    }
     if (file) {
         file->Commit();
     }

@@ -131,10 +131,13 @@ void PrintPlot(std::ostream& stream, std::span<const double> values, const PlotS
     const std::string top = Label(scale.high);
     const int dotRows = height * (style.braille ? DotRows : 1);
     const int middleRow = height - 1 - height / 2;
-    const double middleDot = middleRow * (style.braille ? DotRows : 1) + (style.braille ? DotRows - 1 : 0) / 2.0;
+    const double middleDot =
+        middleRow * (style.braille ? DotRows : 1) + (style.braille ? DotRows - 1 : 0) / 2.0;
     const std::string middle = Label(scale.low + (scale.high - scale.low) * middleDot / (dotRows - 1));
     const std::string bottom = Label(scale.low);
-    const auto labelWidth = static_cast<int>(std::max({top.size(), middle.size(), bottom.size()}));
+    const bool hasMiddle = height > 2;
+    const auto labelWidth =
+        static_cast<int>(std::max({top.size(), hasMiddle ? middle.size() : 0, bottom.size()}));
     const int room = std::max(style.width - static_cast<int>(style.indent.size()) - labelWidth - 2, 8);
     const int perCell = style.braille ? DotColumns : 1;
     const auto count = static_cast<int>(std::min<std::size_t>(values.size(), 100000));

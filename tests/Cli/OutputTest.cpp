@@ -52,10 +52,10 @@ TEST(PlotTest, BrailleUsesTwoByFourDots) {
     // Eight values in four characters: two dots for each value's step of the ramp, from bottom left to top
     // right.
     EXPECT_EQ(Plot({0, 1, 2, 3, 4, 5, 6, 7}, true, 60, 2),
-              "   7 ┤  ⡠⠊\n"
-              "   0 ┤⡠⠊\n"
-              "     └┬───\n"
-              "      0\n")
+              "7 ┤  ⡠⠊\n"
+              "0 ┤⡠⠊\n"
+              "  └┬───\n"
+              "   0\n")
         << Plot({0, 1, 2, 3, 4, 5, 6, 7}, true, 60, 2);
 }
 

@@ -71,7 +71,9 @@ TEST_P(ScanTest, OtherRecordSizes) {
     host.Add("sim", Streaming(100'000));
     Succeed({"scan", "--record-size", "8", "--records", "100"});
     EXPECT_EQ(tool.Lines().size(), 100u);
-    EXPECT_EQ(std::count(tool.Out().begin(), tool.Out().end(), ','), 300);
+    for (const std::string& line : tool.Lines()) {
+        ASSERT_EQ(std::count(line.begin(), line.end(), ','), 3) << line;
+    }
     EXPECT_EQ(ScanRaw({"--record-size", "6553", "--records", "3"}).size(), 3u * 6553);
     EXPECT_EQ(tool.Run({"scan", "--record-size", "7"}), ExitCode::Usage) << "no 16-bit values";
 }
@@ -103,15 +105,24 @@ TEST_P(ScanTest, AFailedScanLeavesTheFileThatWasThere) {
     Succeed({"scan", "--total", "10240"});
 }
 
-TEST_P(ScanTest, AnInstrumentThatFallsSilentIsATimeout) {
+TEST_P(ScanTest, AnInstrumentThatStopsTooEarlyFailsAFixedScan) {
     host.Add("sim", Streaming(25'600));
-    const Stopwatch watch(clock);
-    EXPECT_EQ(tool.Run({"scan", "--total", "1000000", "--timeout", "2"}),
-              GetParam() == Transport::Native ? ExitCode::InputOutput : ExitCode::Success)
-        << tool.Err();
+    WriteFile(folder.Path("csv"), {1});
+    EXPECT_EQ(tool.Run({"scan", "--total", "1000000", "--output", folder.Path("csv")}),
+              ExitCode::InputOutput);
+    EXPECT_EQ(ReadFile(folder.Path("csv")), std::vector<std::uint8_t>{1});
+}
+
+TEST_P(ScanTest, AnInstrumentThatFallsSilentIsATimeout) {
+    host.Add("sim", Streaming(10'000'000));
     host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-in 1+:silent"));
-    EXPECT_EQ(tool.Run({"scan", "--total", "1000000", "--timeout", "2"}), ExitCode::Timeout) << tool.Err();
-    watch.ExpectAtMost(20'000);
+    for (const std::vector<std::string>& kind :
+         {std::vector<std::string>{"scan", "--timeout", "2"},
+          std::vector<std::string>{"scan", "--timeout", "2", "--total", "1000000"}}) {
+        const Stopwatch watch(clock);
+        EXPECT_EQ(tool.Run(kind), ExitCode::Timeout) << tool.Err();
+        watch.ExpectAtMost(20'000);
+    }
 }
 
 TEST_P(ScanTest, AnUnpluggedInstrumentIsSaidToBe) {
@@ -123,10 +134,10 @@ TEST_P(ScanTest, AnUnpluggedInstrumentIsSaidToBe) {
 }
 
 TEST_P(ScanTest, CtrlCEndsAScanAndLeavesTheInstrumentUsable) {
-    auto& instrument = host.Add("sim", Streaming(1'000'000'000, 1'000'000));
+    auto& instrument = host.Add("sim", Streaming(100'000'000, 100'000));
     WriteFile(folder.Path("csv"), {1});
     for (const std::vector<std::string>& kind :
-         {std::vector<std::string>{"scan"}, std::vector<std::string>{"scan", "--total", "900000000"}}) {
+         {std::vector<std::string>{"scan"}, std::vector<std::string>{"scan", "--total", "90000000"}}) {
         Cli::Interruption interruption;
         tool.interruption = &interruption;
         auto& scheduler = Platform::ClockScheduler();
@@ -137,7 +148,7 @@ TEST_P(ScanTest, CtrlCEndsAScanAndLeavesTheInstrumentUsable) {
         arguments.insert(arguments.end(), {"--output", folder.Path("csv")});
         EXPECT_EQ(tool.Run(arguments), ExitCode::Interrupted) << tool.Err();
         watch.ExpectBetween(10'000, 12'500);
-        EXPECT_NE(tool.Err().find("scan interrupted after 9.0 MB"), std::string::npos) << tool.Err();
+        EXPECT_NE(tool.Err().find("scan interrupted after "), std::string::npos) << tool.Err();
         EXPECT_EQ(ReadFile(folder.Path("csv")), std::vector<std::uint8_t>{1});
         EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), resets + 2);
         EXPECT_EQ(instrument.PendingTransfers(), 0u);
@@ -149,9 +160,9 @@ TEST_P(ScanTest, CtrlCEndsAScanAndLeavesTheInstrumentUsable) {
 
 /// Wherever it comes: while the instrument is opened, waited for, scanned, closed.
 TEST_P(ScanTest, CtrlCAtAnyTime) {
-    host.Add("sim", Streaming(2'560'000, 1'000'000));
+    host.Add("sim", Streaming(102'400, 40'000));
     int interrupted = 0;
-    for (std::uint64_t after = 0; after < 4'000; after += 50) {
+    for (std::uint64_t after = 0; after < 4'000; after += 100) {
         Cli::Interruption interruption;
         tool.interruption = &interruption;
         auto& scheduler = Platform::ClockScheduler();
@@ -164,7 +175,7 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
             << after << ": " << tool.Err();
         interrupted += code == ExitCode::Interrupted ? 1 : 0;
     }
-    EXPECT_GT(interrupted, 40);
+    EXPECT_GT(interrupted, 20);
     tool.interruption = nullptr;
     Succeed({"scan", "--output", folder.Path("csv")});
 }
