@@ -240,6 +240,7 @@ TEST_P(InstrumentCommandsTest, FailuresHaveTheirExitCodesAndNameTheInstrument) {
              Case{"bulk-in 0+:silent", ExitCode::Timeout},
              Case{"bulk-in 0:gone-during", ExitCode::NoInstrument},
              Case{"control 1:stall", ExitCode::InputOutput},
+             Case{"control 1:silent", ExitCode::Timeout},
              Case{"bulk-in 0:gone-before", ExitCode::NoInstrument},
              Case{"control 1:gone-after", ExitCode::NoInstrument},
              Case{"control 0:stall", ExitCode::InputOutput},
