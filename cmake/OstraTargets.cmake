@@ -60,3 +60,9 @@ function(ostra_test NAME)
   add_test(NAME ${NAME} COMMAND ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:${NAME}>)
   set_tests_properties(${NAME} PROPERTIES TIMEOUT 300 SKIP_RETURN_CODE 77)
 endfunction()
+
+# ostra_fuzz(NAME SOURCES ... [LINK ...]): a libFuzzer target; its inputs to begin with are in fuzz/corpus/NAME.
+function(ostra_fuzz NAME)
+  ostra_program(${NAME} ${ARGN})
+  target_link_options(${NAME} PRIVATE -fsanitize=fuzzer)
+endfunction()
