@@ -1,0 +1,299 @@
+// The library on a real Linux kernel: runs inside the virtual machine, where ostra-simulator plugs itself
+// into the kernel's virtual USB host. Everything goes through usbfs and libusb.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <chrono>
+#include <cstdlib>
+#include <fstream>
+#include <functional>
+#include <thread>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
+#include "DeviceDriver/Ostra/USB/USBBrowser.h"
+#include "ostra.h"
+#include "Platform/HostQueries.h"
+#include "Platform/Usb/UdevBus.h"
+#include "Support/ResourceCount.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using DeviceDriver::Generic::EventListener;
+using DeviceDriver::Generic::Utilities::DeviceDriverException;
+using DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
+using DeviceDriver::Ostra::USB::USBBrowser;
+using std::chrono::milliseconds;
+using std::chrono::steady_clock;
+
+bool WaitFor(const std::function<bool()>& condition, milliseconds limit = milliseconds(8000)) {
+    const auto end = steady_clock::now() + limit;
+    while (!condition()) {
+        if (steady_clock::now() > end) {
+            return false;
+        }
+        std::this_thread::sleep_for(milliseconds(20));
+    }
+    return true;
+}
+
+bool AnyPluggedIn() {
+    return !Platform::Usb::ListRegisteredDevices().empty();
+}
+
+/// A port is free again some time after its device was unplugged.
+bool AllPortsFree() {
+    std::ifstream status("/sys/devices/platform/vhci_hcd.0/status");
+    std::string line;
+    std::getline(status, line);
+    while (std::getline(status, line)) {
+        if (line.find(" 004 ") == std::string::npos) {
+            return false;
+        }
+    }
+    return true;
+}
+
+/// ostra-simulator, plugged into the kernel for the object's life.
+class PluggedInstrument final {
+  public:
+    explicit PluggedInstrument(std::vector<std::string> arguments) {
+        EXPECT_TRUE(WaitFor(&AllPortsFree)) << "the port does not become free";
+        arguments.insert(arguments.begin(), {"/root/ostra-simulator", "--attach"});
+        process = fork();
+        if (process == 0) {
+            std::vector<char*> words;
+            for (std::string& argument : arguments) {
+                words.push_back(argument.data());
+            }
+            words.push_back(nullptr);
+            (void)!freopen("/dev/null", "w", stdout);
+            execv(words[0], words.data());
+            _exit(127);
+        }
+        EXPECT_TRUE(WaitFor(&AnyPluggedIn)) << "the kernel does not show the instrument";
+    }
+    ~PluggedInstrument() {
+        Unplug();
+        WaitFor([] { return !AnyPluggedIn(); });
+    }
+    PluggedInstrument(const PluggedInstrument&) = delete;
+    PluggedInstrument& operator=(const PluggedInstrument&) = delete;
+
+    void Unplug() {
+        if (process > 0) {
+            kill(process, SIGKILL);
+            waitpid(process, nullptr, 0);
+            process = -1;
+        }
+    }
+
+  private:
+    pid_t process = -1;
+};
+
+std::string LastError() {
+    return b5ae189db26b2a1b("LastError");
+}
+
+std::vector<std::uint8_t> CountingImage() {
+    std::vector<std::uint8_t> image(OSTRA_IMAGE_SIZE);
+    for (std::size_t i = 0; i < image.size(); ++i) {
+        image[i] = static_cast<std::uint8_t>(i * 7 + i / 256);
+    }
+    return image;
+}
+
+std::string FirstIdentifier() {
+    const auto devices = USBBrowser::Instance()->GetDevices(0);
+    return devices.empty() ? "" : devices.front();
+}
+
+std::vector<std::uint8_t> Scan(PellandoFunctionality& instrument, std::uint32_t record, std::uint32_t total) {
+    instrument.StartScan(record, 2, total);
+    std::vector<std::uint8_t> data;
+    std::vector<std::uint8_t> piece(record);
+    for (std::uint32_t size = record;;) {
+        instrument.GetScanData(piece.data(), size);
+        if (size == 0) {
+            return data;
+        }
+        data.insert(data.end(), piece.begin(), piece.begin() + size);
+    }
+}
+
+class OnKernel : public testing::TestWithParam<bool> {
+  protected:
+    OnKernel() { Platform::Override64BitHost(GetParam()); }
+    ~OnKernel() override { Platform::Override64BitHost(std::nullopt); }
+};
+INSTANTIATE_TEST_SUITE_P(Transports, OnKernel, testing::Bool(),
+                         [](const auto& parameter) { return parameter.param ? "usbio" : "native"; });
+
+TEST_P(OnKernel, WritesAnImageAndReadsItBack) {
+    const PluggedInstrument plugged({});
+    const auto image = CountingImage();
+    ASSERT_EQ(f3355d91d5df0e0b(image.data(), FirstIdentifier().c_str()), OSTRA_OK) << LastError();
+    PellandoFunctionality instrument(nullptr, 0);
+    std::vector<std::uint8_t> first(4096);
+    std::vector<std::uint8_t> second(4096);
+    instrument.ReadEEPROM(0, first);
+    instrument.ReadEEPROM(4096, second);
+    first.insert(first.end(), second.begin(), second.end());
+    EXPECT_EQ(first, image);
+}
+
+TEST_P(OnKernel, TakesReadoutsAndLeavesNothingBehind) {
+    const PluggedInstrument plugged({});
+    std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
+    ASSERT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_OK) << LastError();
+    const auto before = TestSupport::ResourceCount::Take();
+    ASSERT_EQ(d4fb86cecc88582a(values.data(), FirstIdentifier().c_str()), OSTRA_OK) << LastError();
+    EXPECT_TRUE(before.Settles()) << TestSupport::ResourceCount::Take() << " were " << before;
+    EXPECT_NE(*std::ranges::max_element(values), *std::ranges::min_element(values));
+}
+
+TEST_P(OnKernel, RunsBothKindsOfScan) {
+    const PluggedInstrument plugged({"--scan-bytes", "300000"});
+    PellandoFunctionality instrument(nullptr, 0);
+    const auto fixed = Scan(instrument, 1000, 300000);
+    const auto open = Scan(instrument, 1000, 0);
+    EXPECT_EQ(fixed.size(), 300000U);
+    EXPECT_EQ(open.size(), 300000U);
+}
+
+TEST_P(OnKernel, ReportsTheButtonAndTheRemoval) {
+    struct Listener final : EventListener {
+        void MessageFromDevice(std::uint32_t code, std::uint32_t) override {
+            ++(code == DeviceDriver::Generic::MessageButtonData ? pressed : removed);
+        }
+        std::atomic<int> pressed = 0;
+        std::atomic<int> removed = 0;
+    } listener;
+    PluggedInstrument plugged({"--button-after", "1500"});
+    PellandoFunctionality instrument(&listener, 0);
+    EXPECT_TRUE(WaitFor([&] { return listener.pressed == 1; }));
+    plugged.Unplug();
+    EXPECT_TRUE(WaitFor([&] { return listener.removed == 1; }));
+    EXPECT_THROW(instrument.SetMeasureMode(1), DeviceDriverException);
+}
+
+TEST_P(OnKernel, SurvivesThePlugBeingPulled) {
+    const auto pullDuring = [](std::vector<std::string> arguments, const std::function<void()>& operation) {
+        PluggedInstrument plugged(std::move(arguments));
+        std::thread puller([&] {
+            std::this_thread::sleep_for(milliseconds(1500));
+            plugged.Unplug();
+        });
+        operation();
+        puller.join();
+    };
+    pullDuring({"--scan-bytes", "100000000", "--rate", "2e5"}, [] {
+        PellandoFunctionality instrument(nullptr, 0);
+        EXPECT_THROW(instrument.StartScan(256, 2, 100000000), DeviceDriverException);
+    });
+    pullDuring({"--faults", "bulk-out 0+:late=100"}, [] {
+        EXPECT_EQ(f3355d91d5df0e0b(CountingImage().data(), ""), OSTRA_UNKNOWN_FAILURE);
+        EXPECT_NE(LastError(), "");
+    });
+    // Plugged in again it works on, under the same name.
+    const PluggedInstrument plugged({});
+    std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
+    EXPECT_EQ(d4fb86cecc88582a(values.data(), FirstIdentifier().c_str()), OSTRA_OK) << LastError();
+}
+
+TEST_P(OnKernel, BelongsToOneProcess) {
+    const PluggedInstrument plugged({});
+    int ready[2];
+    ASSERT_EQ(pipe(ready), 0);
+    const pid_t other = fork();
+    if (other == 0) {
+        const PellandoFunctionality instrument(nullptr, 0);
+        (void)!write(ready[1], "x", 1);
+        std::this_thread::sleep_for(std::chrono::seconds(60));
+        _exit(0);
+    }
+    char byte = 0;
+    ASSERT_EQ(read(ready[0], &byte, 1), 1);
+    try {
+        const PellandoFunctionality instrument(nullptr, 0);
+        ADD_FAILURE() << "opened twice";
+    } catch (const DeviceDriverException& exception) {
+        const std::string expected =
+            GetParam() ? "A different process has opened the device." : "(Win32 Error (170) : ";
+        EXPECT_THAT(exception.what(), testing::HasSubstr(expected));
+    }
+    EXPECT_THAT(FirstIdentifier(), testing::HasSubstr("usb-"));  // listed all the same
+    kill(other, SIGKILL);
+    waitpid(other, nullptr, 0);
+    EXPECT_NO_THROW(PellandoFunctionality(nullptr, 0));
+}
+
+/// Unplugs at every so many transfers of a readout, an image write and a scan: each time a documented
+/// outcome, and the instrument works when it is back.
+TEST_P(OnKernel, UnplugsAtTransferAfterTransfer) {
+    struct Job {
+        const char* name;
+        int transfers;
+        std::vector<std::string> arguments;
+        std::function<void()> run;
+    };
+    const auto expected = [](const std::function<void()>& work) {
+        return [work] {
+            try {
+                work();
+            } catch (const DeviceDriverException&) {
+            }
+        };
+    };
+    const std::vector<Job> jobs{
+        {"readout", 4, {}, expected([] {
+             PellandoFunctionality instrument(nullptr, 0);
+             std::array<std::uint8_t, 256> buffer{};
+             instrument.SetMeasureParameters(294, 0, 1, 6);
+             instrument.MeasureRequest(buffer.data(), 256, 1);
+         })},
+        {"image write", 128, {}, [] { f3355d91d5df0e0b(CountingImage().data(), ""); }},
+        {"scan", 6, {"--scan-bytes", "300000"}, expected([] {
+             PellandoFunctionality instrument(nullptr, 0);
+             Scan(instrument, 1000, 300000);
+         })},
+    };
+    const char* const wanted = std::getenv("OSTRA_GUEST_UNPLUGS");
+    const int unplugs = (wanted ? std::atoi(wanted) : 100) / 2;  // for each transport
+    constexpr std::array kinds{"gone-before", "gone-during", "gone-after"};
+    int done = 0;
+    for (int round = 0; done < unplugs; ++round) {
+        const Job& job = jobs[static_cast<std::size_t>(round) % jobs.size()];
+        const int transfer = (round / 3 * 7) % job.transfers;
+        const std::string plan =
+            std::to_string(transfer) + ":" + kinds[static_cast<std::size_t>(round) / 3 % kinds.size()];
+        SCOPED_TRACE(std::string(job.name) + " " + plan);
+        std::vector<std::string> arguments = job.arguments;
+        arguments.insert(arguments.end(), {"--faults", plan});
+        {
+            const PluggedInstrument plugged(arguments);
+            const auto start = steady_clock::now();
+            job.run();
+            EXPECT_LT(steady_clock::now() - start, std::chrono::seconds(20));
+        }
+        ++done;
+        if (HasFailure()) {
+            return;
+        }
+    }
+    std::printf("%d unplugs\n", done);
+    const PluggedInstrument plugged({});
+    std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
+    EXPECT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_OK) << LastError();
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests
