@@ -5,6 +5,7 @@
 #include <ostream>
 
 #include "Commands/Commands.h"
+#include "SystemCommands.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -35,6 +36,7 @@ void BuildCommandLine(CLI::App& app, Session& session) {
     for (const AddCommand add : Commands) {
         add(app, session);
     }
+    AddSystemCommands(app, session);
     app.footer(Footer);  // after the commands, which would inherit it
 }
 

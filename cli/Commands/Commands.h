@@ -19,6 +19,10 @@ void AddReset(CLI::App& app, Session& session);
 void AddMonitor(CLI::App& app, Session& session);
 void AddWriteImage(CLI::App& app, Session& session);
 
+/// On Linux only; see SystemCommands.h.
+void AddRegister(CLI::App& app, Session& session);
+void AddDoctor(CLI::App& app, Session& session);
+
 using AddCommand = void (*)(CLI::App& app, Session& session);
 
 /// The commands in the order in which the help lists them.

@@ -1,6 +1,7 @@
 #include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
 #include "Output/Table.h"
+#include "SystemCommands.h"
 #include "Utilities/Tools/Win32/SystemHelperWin.h"
 
 namespace Varnholt::Cli {
@@ -8,10 +9,15 @@ namespace {
 
 struct Options {
     InstrumentOptions instrument;
+    bool candidates = false;
     bool json = false;
 };
 
 void List(Session& session, const Options& options) {
+    if (options.candidates) {
+        PrintCandidates(session, options.json);
+        return;
+    }
     session.UseTransport(options.instrument.transport);
     const std::string transport = Utilities::Tools::Is64BitOS() ? "usbio" : "native";
     const std::vector<std::string> connected = ConnectedInstruments();
@@ -35,6 +41,8 @@ void AddList(CLI::App& app, Session& session) {
     const auto options = std::make_shared<Options>();
     CLI::App* const command = app.add_subcommand("list", "list the instruments that are connected");
     AddTransportOption(command, options->instrument);
+    command->add_flag("--candidates", options->candidates,
+                      "show the USB devices that could be instruments instead, registered or not");
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, List);
 }

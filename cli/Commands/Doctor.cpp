@@ -1,0 +1,70 @@
+#include <ostream>
+
+#include "Commands/CommandLine.h"
+#include "Commands/Commands.h"
+#include "Linux/Diagnosis.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+struct Options {
+    std::string transport;
+    bool json = false;
+};
+
+const char* NameOf(Finding::Level level) {
+    switch (level) {
+        case Finding::Level::Good:
+            return "good";
+        case Finding::Level::Note:
+            return "note";
+        case Finding::Level::Problem:
+            return "problem";
+    }
+    return "";
+}
+
+void Doctor(Session& session, const Options& options) {
+    session.UseTransport(options.transport);
+    const std::vector<Finding> findings = Diagnose(session);
+    Json list = Json::array();
+    ExitCode code = ExitCode::Success;
+    for (const Finding& finding : findings) {
+        list.push_back({{"level", NameOf(finding.level)},
+                        {"subject", finding.subject},
+                        {"text", finding.text},
+                        {"fix", finding.fix}});
+        if (code == ExitCode::Success) {
+            code = finding.code;
+        }
+        if (!options.json) {
+            session.Out() << NameOf(finding.level) << ": " << finding.subject
+                          << (finding.subject.empty() ? "" : " ") << finding.text << "\n";
+            if (!finding.fix.empty()) {
+                session.Out() << "    " << finding.fix << "\n";
+            }
+        }
+    }
+    if (options.json) {
+        session.Print({{"findings", list}});
+    }
+    if (code != ExitCode::Success) {
+        throw ToolFailure(code, "an instrument cannot be used; see above");
+    }
+}
+
+}  // namespace
+
+void AddDoctor(CLI::App& app, Session& session) {
+    const auto options = std::make_shared<Options>();
+    CLI::App* const command =
+        app.add_subcommand("doctor", "say why an instrument is not found or cannot be used, and what to do");
+    command->footer("Every instrument that is free is opened, and thereby reset, to see whether it answers.");
+    command
+        ->add_option("--transport", options->transport, "native or usbio; without it, as the machine prefers")
+        ->check(CLI::IsMember({"native", "usbio"}));
+    AddJsonFlag(command, options->json);
+    SetAction(command, session, options, Doctor);
+}
+
+}  // namespace Varnholt::Cli
