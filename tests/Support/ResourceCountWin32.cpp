@@ -1,5 +1,8 @@
-#include <tlhelp32.h>
+// The system's header first: the other one needs it.
+// clang-format off
 #include <windows.h>
+#include <tlhelp32.h>
+// clang-format on
 
 #include "Support/ResourceCount.h"
 
