@@ -1,5 +1,8 @@
 #pragma once
 
+#include <memory>
+#include <string>
+
 namespace CLI {
 class App;
 }
@@ -13,5 +16,14 @@ void AddSystemCommands(CLI::App& app, Session& session);
 
 /// Prints the devices that could be instruments, as a table or JSON (--candidates of the list command).
 void PrintCandidates(Session& session, bool json);
+
+/// Records the USB traffic of the instruments in a pcapng file, for the object's life.
+class TrafficRecording {
+  public:
+    virtual ~TrafficRecording() = default;
+    /// Throws `ToolFailure` when something could not be written.
+    virtual void Check() const = 0;
+};
+std::unique_ptr<TrafficRecording> RecordTraffic(const std::string& file);
 
 }  // namespace Varnholt::Cli

@@ -1,10 +1,43 @@
 #include "Commands/Commands.h"
+#include "Failure.h"
 #include "Output/Table.h"
+#include "Platform/DeviceFiles.h"
+#include "Platform/Drivers/DriverFileSystem.h"
+#include "Platform/Usb/PcapngWriter.h"
+#include "Platform/Usb/SystemUsbBus.h"
 #include "Platform/Usb/UdevBus.h"
+#include "Platform/Usb/UsbCapture.h"
 #include "Session.h"
 #include "SystemCommands.h"
 
 namespace Varnholt::Cli {
+namespace {
+
+class BusRecording final : public TrafficRecording {
+  public:
+    explicit BusRecording(const std::string& file) : name(file), writer(file, "ostra " OSTRA_VERSION) {
+        Check();
+    }
+
+    void Check() const override {
+        if (writer.Failed()) {
+            throw ToolFailure(ExitCode::File, name + " cannot be written");
+        }
+    }
+
+  private:
+    const std::string name;
+    Platform::Usb::PcapngWriter writer;
+    Platform::Usb::CapturingBus bus{Platform::Usb::SystemUsbBus(), writer};
+    const std::unique_ptr<Platform::DeviceFileSystem> files = Platform::Drivers::MakeDriverFileSystem(bus);
+    const Platform::ScopedDeviceFiles filesInForce{*files};
+};
+
+}  // namespace
+
+std::unique_ptr<TrafficRecording> RecordTraffic(const std::string& file) {
+    return std::make_unique<BusRecording>(file);
+}
 
 void AddSystemCommands(CLI::App& app, Session& session) {
     AddRegister(app, session);

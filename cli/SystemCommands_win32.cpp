@@ -10,4 +10,10 @@ void PrintCandidates(Session&, bool) {
                       "an instrument is recognised by the interface class that its driver registers");
 }
 
+std::unique_ptr<TrafficRecording> RecordTraffic(const std::string&) {
+    throw ToolFailure(ExitCode::Usage,
+                      "--capture is not available on Windows: the traffic is the drivers' own",
+                      "a USB protocol analyser for Windows records it");
+}
+
 }  // namespace Varnholt::Cli

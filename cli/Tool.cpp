@@ -33,6 +33,8 @@ void BuildCommandLine(CLI::App& app, Session& session) {
     app.require_subcommand(1);
     app.set_version_flag("--version", "ostra " OSTRA_VERSION, "print the version");
     app.set_help_flag("-h,--help", "print this help");
+    static std::string captureFile;  // read by `CaptureFileIn`; here for the help
+    app.add_option("--capture", captureFile, "record the USB traffic in a pcapng file")->type_name("FILE");
     for (const AddCommand add : Commands) {
         add(app, session);
     }
@@ -44,6 +46,21 @@ void BuildCommandLine(CLI::App& app, Session& session) {
 std::vector<std::string> Reversed(std::vector<std::string> arguments) {
     std::reverse(arguments.begin(), arguments.end());
     return arguments;
+}
+
+/// What --capture names. Looked for before anything else, because everything else stands on the recorded
+/// files.
+std::string CaptureFileIn(const std::vector<std::string>& arguments) {
+    std::string file;
+    CLI::App early;
+    early.set_help_flag();
+    early.allow_extras();
+    early.add_option("--capture", file);
+    try {
+        early.parse(Reversed(arguments));
+    } catch (const CLI::ParseError&) {  // the whole command line is understood later, with a better message
+    }
+    return file;
 }
 
 ExitCode Run(const std::vector<std::string>& arguments, Surroundings& surroundings, Session& session) {
@@ -77,9 +94,27 @@ ExitCode Run(const std::vector<std::string>& arguments, Surroundings& surroundin
 
 ExitCode RunTool(const std::vector<std::string>& arguments, Surroundings& surroundings,
                  Interruption& interruption) {
+    // The session's files stand on the recorded ones, so the recording is there before the session and
+    // outlives it.
+    std::unique_ptr<TrafficRecording> recording;
+    std::exception_ptr notRecorded;
+    try {
+        if (const std::string file = CaptureFileIn(arguments); !file.empty()) {
+            recording = RecordTraffic(file);
+        }
+    } catch (...) {
+        notRecorded = std::current_exception();
+    }
     Session session(surroundings, interruption);
     try {
-        return Run(arguments, surroundings, session);
+        if (notRecorded) {
+            std::rethrow_exception(notRecorded);
+        }
+        const ExitCode code = Run(arguments, surroundings, session);
+        if (recording) {
+            recording->Check();
+        }
+        return code;
     } catch (...) {
         const FailureReport report = session.Explain(std::current_exception());
         session.Report(report);

@@ -59,6 +59,12 @@ function(ostra_test NAME)
   target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
   add_test(NAME ${NAME} COMMAND ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:${NAME}>)
   set_tests_properties(${NAME} PROPERTIES TIMEOUT 300 SKIP_RETURN_CODE 77)
+  # The native transport locks an instrument for the whole machine, by its path: tests of it wait for each other.
+  foreach(LIBRARY IN ITEMS ostra_native ostra_browser ostra_interface ostra_cli)
+    if(LIBRARY IN_LIST ARG_LINK)
+      set_tests_properties(${NAME} PROPERTIES RESOURCE_LOCK instruments)
+    endif()
+  endforeach()
 endfunction()
 
 # ostra_fuzz(NAME SOURCES ... [LINK ...]): a libFuzzer target; its inputs to begin with are in fuzz/corpus/NAME.
