@@ -23,7 +23,8 @@ static NTSTATUS PassDown(DEVICE_OBJECT* device, IRP* packet) {
 static NTSTATUS NTAPI AddDevice(DRIVER_OBJECT* driver, DEVICE_OBJECT* physical) {
     static ULONG deviceCount;
     DEVICE_OBJECT* device;
-    NTSTATUS status = IoCreateDevice(driver, sizeof(DeviceExtension), NULL, FILE_DEVICE_UNKNOWN, 0, FALSE, &device);
+    NTSTATUS status =
+        IoCreateDevice(driver, sizeof(DeviceExtension), NULL, FILE_DEVICE_UNKNOWN, 0, FALSE, &device);
     if (status != STATUS_SUCCESS)
         return status;
     DeviceExtension* extension = ExtensionOf(device);

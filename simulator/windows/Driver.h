@@ -1,5 +1,5 @@
-/* The driver half of the stand-in. One source for both drivers: with OSTRA_USBIO it presents the interface class of the
- * USBIO driver, otherwise that of the instrument's own driver with its three pipes. */
+/* The driver half of the stand-in. One source for both drivers: with OSTRA_USBIO it presents the interface
+ * class of the USBIO driver, otherwise that of the instrument's own driver with its three pipes. */
 #ifndef OSTRA_SIMULATOR_WINDOWS_DRIVER_H
 #define OSTRA_SIMULATOR_WINDOWS_DRIVER_H
 

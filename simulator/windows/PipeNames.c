@@ -1,13 +1,13 @@
-/* The names of the pipes. A host opens the listed path of the device with "\PIPE01" to "\PIPE03" behind it. Wine looks
- * nothing up below a device and does not tell the driver the rest of a path either, so each pipe is a device of its own,
- * and the names lead there:
+/* The names of the pipes. A host opens the listed path of the device with "\PIPE01" to "\PIPE03" behind it.
+ * Wine looks nothing up below a device and does not tell the driver the rest of a path either, so each pipe
+ * is a device of its own, and the names lead there:
  *
- * The listed path is "\\.\NAME " with a blank behind it. Opened as it is, it loses the blank and is the link \??\NAME that
- * Wine makes for the device interface. With a pipe behind it, it keeps the blank, and "\??\NAME " is a directory made
- * here, with a link for each pipe.
+ * The listed path is "\\.\NAME " with a blank behind it. Opened as it is, it loses the blank and is the link
+ * \??\NAME that Wine makes for the device interface. With a pipe behind it, it keeps the blank, and "\??\NAME
+ * " is a directory made here, with a link for each pipe.
  *
- * The enumeration lists what the registry says of the interface class; of two entries for one device the later one wins,
- * so a second entry with the other path is all it takes. */
+ * The enumeration lists what the registry says of the interface class; of two entries for one device the
+ * later one wins, so a second entry with the other path is all it takes. */
 #include "Driver.h"
 
 #if PIPE_COUNT > 0
@@ -79,7 +79,8 @@ static UNICODE_STRING* PipeDevice(Name* name, const DeviceExtension* extension, 
 
 static NTSTATUS OpenKey(const UNICODE_STRING* path, ULONG options, HANDLE* key) {
     OBJECT_ATTRIBUTES attributes;
-    InitializeObjectAttributes(&attributes, (UNICODE_STRING*)path, OBJ_KERNEL_HANDLE | OBJ_CASE_INSENSITIVE, NULL, NULL);
+    InitializeObjectAttributes(&attributes, (UNICODE_STRING*)path, OBJ_KERNEL_HANDLE | OBJ_CASE_INSENSITIVE,
+                               NULL, NULL);
     return ZwCreateKey(key, KEY_ALL_ACCESS, &attributes, 0, NULL, options, NULL);
 }
 
@@ -127,7 +128,8 @@ static NTSTATUS WriteEntry(const DeviceExtension* extension, ULONG linked) {
     ZwClose(key);
 
     RtlAppendUnicodeToString(&path.text, L"\\Control");
-    if (status != STATUS_SUCCESS || (status = OpenKey(&path.text, REG_OPTION_VOLATILE, &key)) != STATUS_SUCCESS)
+    if (status != STATUS_SUCCESS ||
+        (status = OpenKey(&path.text, REG_OPTION_VOLATILE, &key)) != STATUS_SUCCESS)
         return status;
     RtlInitUnicodeString(&valueName, L"Linked");
     status = ZwSetValueKey(key, &valueName, 0, REG_DWORD, &linked, sizeof linked);
@@ -140,8 +142,8 @@ static NTSTATUS MakePipe(DEVICE_OBJECT* device, ULONG pipe) {
     Name deviceName, linkName;
     DEVICE_OBJECT* made;
     PipeDevice(&deviceName, extension, pipe);
-    NTSTATUS status = IoCreateDevice(device->DriverObject, sizeof(DeviceExtension), &deviceName.text, FILE_DEVICE_UNKNOWN,
-                                     0, FALSE, &made);
+    NTSTATUS status = IoCreateDevice(device->DriverObject, sizeof(DeviceExtension), &deviceName.text,
+                                     FILE_DEVICE_UNKNOWN, 0, FALSE, &made);
     if (status != STATUS_SUCCESS)
         return status;
     RtlZeroMemory(ExtensionOf(made), sizeof(DeviceExtension));

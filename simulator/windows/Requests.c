@@ -26,10 +26,12 @@ NTSTATUS NTAPI DispatchCreate(DEVICE_OBJECT* device, IRP* packet) {
 /* Requests of the file can still be pending: no cleanup packet comes before this one. */
 NTSTATUS NTAPI DispatchClose(DEVICE_OBJECT* device, IRP* packet) {
     DeviceExtension* const extension = ExtensionOf(device);
-    StandInClose(FileOf(packet));
+    StandInFile* const file = FileOf(packet); /* null: was refused when it was opened */
+    if (file)
+        StandInClose(file);
     CompleteAtOnce(packet, STATUS_SUCCESS, 0);
     /* A pipe of an instrument that was unplugged has waited for its last file. */
-    if (--extension->openFiles == 0 && extension->pipe && !extension->instrument)
+    if (file && --extension->openFiles == 0 && extension->pipe && !extension->instrument)
         IoDeleteDevice(device);
     return STATUS_SUCCESS;
 }
@@ -56,6 +58,11 @@ static void PacketCompleted(void* packet, Status status, ULONG bytes) {
     CompleteAtOnce((IRP*)packet, status, bytes);
 }
 
+/* A file whose opening was refused: Wine opens it all the same. */
+static NTSTATUS Refuse(IRP* packet) {
+    return CompleteAtOnce(packet, STATUS_FILE_CLOSED, 0);
+}
+
 static StandInRequest MakeRequest(IRP* packet) {
     static LONG requestCount;
     const ULONG number = (ULONG)InterlockedIncrement(&requestCount);
@@ -70,34 +77,43 @@ static NTSTATUS Started(IRP* packet, NTSTATUS status, ULONG bytes) {
 
 NTSTATUS NTAPI DispatchRead(DEVICE_OBJECT* device, IRP* packet) {
     (void)device;
+    if (!FileOf(packet))
+        return Refuse(packet);
     const ULONG length = IoGetCurrentIrpStackLocation(packet)->Parameters.Read.Length;
     ULONG bytes = 0;
-    const NTSTATUS status = StandInRead(FileOf(packet), packet->AssociatedIrp.SystemBuffer, length, MakeRequest(packet), &bytes);
+    const NTSTATUS status =
+        StandInRead(FileOf(packet), packet->AssociatedIrp.SystemBuffer, length, MakeRequest(packet), &bytes);
     return Started(packet, status, bytes);
 }
 
 NTSTATUS NTAPI DispatchWrite(DEVICE_OBJECT* device, IRP* packet) {
     (void)device;
+    if (!FileOf(packet))
+        return Refuse(packet);
     const ULONG length = IoGetCurrentIrpStackLocation(packet)->Parameters.Write.Length;
     ULONG bytes = 0;
-    const NTSTATUS status = StandInWrite(FileOf(packet), packet->AssociatedIrp.SystemBuffer, length, MakeRequest(packet), &bytes);
+    const NTSTATUS status =
+        StandInWrite(FileOf(packet), packet->AssociatedIrp.SystemBuffer, length, MakeRequest(packet), &bytes);
     return Started(packet, status, bytes);
 }
 
 NTSTATUS NTAPI DispatchControl(DEVICE_OBJECT* device, IRP* packet) {
     (void)device;
+    if (!FileOf(packet))
+        return Refuse(packet);
     const IO_STACK_LOCATION* const stack = IoGetCurrentIrpStackLocation(packet);
     const ULONG code = stack->Parameters.DeviceIoControl.IoControlCode;
     void* const input = packet->AssociatedIrp.SystemBuffer;
     /* The two direct methods map the caller's output buffer, whichever way its data go. */
     void* output = input;
     if ((code & 3) == METHOD_IN_DIRECT || (code & 3) == METHOD_OUT_DIRECT)
-        output = packet->MdlAddress ? MmGetSystemAddressForMdlSafe(packet->MdlAddress, NormalPagePriority) : NULL;
+        output =
+            packet->MdlAddress ? MmGetSystemAddressForMdlSafe(packet->MdlAddress, NormalPagePriority) : NULL;
     else if ((code & 3) != METHOD_BUFFERED)
         return CompleteAtOnce(packet, STATUS_INVALID_DEVICE_REQUEST, 0);
     ULONG bytes = 0;
-    const NTSTATUS status =
-        StandInControl(FileOf(packet), code, input, stack->Parameters.DeviceIoControl.InputBufferLength, output,
-                       output ? stack->Parameters.DeviceIoControl.OutputBufferLength : 0, MakeRequest(packet), &bytes);
+    const NTSTATUS status = StandInControl(
+        FileOf(packet), code, input, stack->Parameters.DeviceIoControl.InputBufferLength, output,
+        output ? stack->Parameters.DeviceIoControl.OutputBufferLength : 0, MakeRequest(packet), &bytes);
     return Started(packet, status, bytes);
 }

@@ -6,9 +6,9 @@
 #include <vector>
 
 #include "ostra.h"
-#include "Platform/VirtualClock.h"
 #include "Protocol/Instrument.h"
 #include "Support/SimulatedHost.h"
+#include "Support/TestClock.h"
 #include "TransferRecorder.h"
 
 namespace Varnholt::Tests {
@@ -31,7 +31,7 @@ std::vector<std::uint8_t> CountingImage() {
 
 class Exports : public testing::TestWithParam<Transport> {
   protected:
-    Platform::VirtualClock clock{1};
+    TestClock clock{TestTime::Virtual, 1};
     SimulatedHost host{GetParam()};
     Simulator::TransferRecorder recorder;
     std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
@@ -56,10 +56,9 @@ INSTANTIATE_TEST_SUITE_P(Transports, Exports, testing::Values(Transport::Native,
 
 TEST_P(Exports, ReadoutReturnsTheSensorsValues) {
     auto& instrument = host.Add("one");
-    const std::uint64_t before = clock.ElapsedMilliseconds();
+    const Stopwatch stopwatch(clock);
     ASSERT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_OK) << LastError();
-    EXPECT_GE(clock.ElapsedMilliseconds() - before, 1000U);
-    EXPECT_LT(clock.ElapsedMilliseconds() - before, 1100U);
+    stopwatch.ExpectBetween(1000, 1099);
     EXPECT_EQ(LastError(), "");
     EXPECT_EQ(values[0], values[1]);
     EXPECT_EQ(values[127], values[126]);

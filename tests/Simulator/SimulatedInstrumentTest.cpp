@@ -224,7 +224,7 @@ TEST_F(SimulatedInstrumentTest, ScanEndsWithTheTransferThatIsNotFull) {
             scanning.Submit(transfer);
             EXPECT_EQ(1, transfer.completions) << test.name;
             sizes.push_back(transfer.actualLength);
-            all.insert(all.end(), transfer.buffer.begin(), transfer.buffer.begin() + transfer.actualLength);
+            all.insert(all.end(), transfer.buffer.data(), transfer.buffer.data() + transfer.actualLength);
         }
         EXPECT_EQ(test.expected, sizes) << test.name;
         EXPECT_EQ(

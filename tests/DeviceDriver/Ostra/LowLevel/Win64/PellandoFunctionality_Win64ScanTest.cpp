@@ -66,7 +66,7 @@ class UsbIoScanTest : public Tests::UsbIoTransportFixture {
             if (size == 0) {
                 return all;
             }
-            all.insert(all.end(), part.begin(), part.begin() + size);
+            all.insert(all.end(), part.data(), part.data() + size);
         }
     }
 
@@ -246,7 +246,7 @@ TEST_F(UsbIoScanTest, DataAreHandedOutInPiecesAndNeverBehindTheEnd) {
         size = 4;
         instrument->GetScanData(part.data(), &size);
         sizes.push_back(size);
-        all.insert(all.end(), part.begin(), part.begin() + size);
+        all.insert(all.end(), part.data(), part.data() + size);
         EXPECT_EQ(part[size], 0xEE);
     }
     EXPECT_THAT(sizes, testing::ElementsAre(4, 4, 2, 0));

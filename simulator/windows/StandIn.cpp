@@ -1,0 +1,97 @@
+#include "StandIn.h"
+
+#include <memory>
+#include <new>
+
+#include "KernelStatus.h"
+#include "StandInFile.h"
+#include "StandInInstrument.h"
+
+// The driver holds these; each keeps its object alive.
+struct StandInInstrument {
+    std::shared_ptr<Varnholt::Simulator::StandInInstrumentObject> object;
+};
+struct StandInFile {
+    std::shared_ptr<Varnholt::Simulator::StandInFileObject> object;
+};
+
+namespace {
+
+namespace Errors = Varnholt::Platform::Errors;
+using Varnholt::Simulator::KernelStatus;
+
+/// Nothing is thrown into the driver.
+template <class Function>
+Status Guarded(Function function) noexcept {
+    try {
+        return function();
+    } catch (const std::bad_alloc&) {
+        return KernelStatus(Errors::NoSystemResources);
+    } catch (...) {
+        return KernelStatus(Errors::GeneralFailure);
+    }
+}
+
+template <class Byte, class Pointer>
+std::span<Byte> Bytes(Pointer* pointer, unsigned long length) {
+    return {static_cast<Byte*>(pointer), pointer != nullptr ? length : 0};
+}
+
+}  // namespace
+
+StandInInstrument* StandInPlugIn(unsigned long index) {
+    StandInInstrument* made = nullptr;
+    Guarded([&] {
+        made = new StandInInstrument{std::make_shared<Varnholt::Simulator::StandInInstrumentObject>(index)};
+        return Status{};
+    });
+    return made;
+}
+
+void StandInUnplug(StandInInstrument* instrument) {
+    instrument->object->Unplug();
+    delete instrument;
+}
+
+Status StandInOpen(StandInInstrument* instrument, int usbIo, unsigned long pipe, StandInFile** file) {
+    return Guarded([&] {
+        Varnholt::Platform::ErrorCode error = Errors::Success;
+        auto driver = instrument->object->Open(usbIo != 0, static_cast<std::uint32_t>(pipe), error);
+        if (!driver) {
+            return KernelStatus(error);
+        }
+        *file = new StandInFile{
+            std::make_shared<Varnholt::Simulator::StandInFileObject>(instrument->object, std::move(driver))};
+        return KernelStatus(Errors::Success);
+    });
+}
+
+void StandInClose(StandInFile* file) {
+    file->object->CancelAll();
+    delete file;
+}
+
+Status StandInRead(StandInFile* file, void* buffer, unsigned long length, StandInRequest request,
+                   unsigned long* bytes) {
+    return Guarded([&] { return file->object->Read(Bytes<std::uint8_t>(buffer, length), request, *bytes); });
+}
+
+Status StandInWrite(StandInFile* file, const void* buffer, unsigned long length, StandInRequest request,
+                    unsigned long* bytes) {
+    return Guarded(
+        [&] { return file->object->Write(Bytes<const std::uint8_t>(buffer, length), request, *bytes); });
+}
+
+Status StandInControl(StandInFile* file, unsigned long code, const void* input, unsigned long inputLength,
+                      void* output, unsigned long outputLength, StandInRequest request,
+                      unsigned long* bytes) {
+    return Guarded([&] {
+        return file->object->Control(static_cast<std::uint32_t>(code),
+                                     Bytes<const std::uint8_t>(input, inputLength),
+                                     Bytes<std::uint8_t>(output, outputLength), request, *bytes);
+    });
+}
+
+void StandInCancel(StandInFile* file, unsigned long requestNumber) {
+    file->object->Cancel(requestNumber);
+}

@@ -1,0 +1,193 @@
+#include "StandInFile.h"
+
+#include <algorithm>
+#include <cstring>
+#include <stdexcept>
+#include <utility>
+#include <vector>
+
+#include "KernelStatus.h"
+#include "Protocol/ByteOrder.h"
+#include "TestControls.h"
+
+namespace Varnholt::Simulator {
+
+using Platform::Drivers::Decision;
+using Platform::Usb::Transfer;
+
+/// A request on its way. Kept alive by the file while it runs, and by whoever cancels it.
+class StandInFileObject::Running final : public Platform::Usb::TransferClient {
+  public:
+    Running(std::shared_ptr<StandInFileObject> owner, const StandInRequest& driversRequest)
+        : file(std::move(owner)), request(driversRequest) {
+        transfer.client = this;
+    }
+
+    void TransferCompleted(Transfer& completed) noexcept override {
+        if (completed.status == Platform::Usb::TransferStatus::Cancelled && file->instrument->IsUnplugged()) {
+            completed.status = Platform::Usb::TransferStatus::DeviceGone;
+        }
+        file->driver->Device().Learn(completed);
+        file->Ended(*this, KernelStatus(file->driver->OutcomeOf(completed.status)));
+    }
+
+    Transfer transfer;
+    const std::shared_ptr<StandInFileObject> file;
+    const StandInRequest request;
+};
+
+StandInFileObject::StandInFileObject(std::shared_ptr<StandInInstrumentObject> opened,
+                                     std::unique_ptr<Platform::Drivers::DriverFile> file)
+    : instrument(std::move(opened)), driver(std::move(file)) {
+    instrument->Add(*this);
+}
+
+StandInFileObject::~StandInFileObject() {
+    instrument->Remove(*this);
+}
+
+Status StandInFileObject::Read(std::span<std::uint8_t> buffer, const StandInRequest& request,
+                               unsigned long& bytes) {
+    const auto running = std::make_shared<Running>(shared_from_this(), request);
+    running->transfer.data = buffer.data();
+    running->transfer.length = static_cast<std::uint32_t>(buffer.size());
+    return Start(driver->Read(running->transfer), running, bytes);
+}
+
+Status StandInFileObject::Write(std::span<const std::uint8_t> data, const StandInRequest& request,
+                                unsigned long& bytes) {
+    const auto running = std::make_shared<Running>(shared_from_this(), request);
+    // A transfer has one buffer for both directions; that of a write is only read.
+    running->transfer.data = const_cast<std::uint8_t*>(data.data());
+    running->transfer.length = static_cast<std::uint32_t>(data.size());
+    return Start(driver->Write(running->transfer), running, bytes);
+}
+
+Status StandInFileObject::Control(std::uint32_t code, std::span<const std::uint8_t> input,
+                                  std::span<std::uint8_t> output, const StandInRequest& request,
+                                  unsigned long& bytes) {
+    if (const auto status = TestControl(code, input, output, bytes)) {
+        return *status;
+    }
+    // With the buffered method, input and output are one buffer.
+    const std::vector<std::uint8_t> copiedInput(input.begin(), input.end());
+    const auto running = std::make_shared<Running>(shared_from_this(), request);
+    const Decision decision = driver->Control(code, copiedInput, output, running->transfer);
+    if (code == Protocol::UsbIoDriver::Control::GetDriverInfo && decision.kind == Decision::Kind::Done &&
+        output.size() >= 2) {
+        Protocol::StoreLittle16(output.data(), instrument->interfaceVersion);
+    }
+    return Start(decision, running, bytes);
+}
+
+Status StandInFileObject::Start(const Decision& decision, const std::shared_ptr<Running>& running,
+                                unsigned long& bytes) {
+    bytes = decision.bytes;
+    if (decision.kind != Decision::Kind::Send) {
+        return KernelStatus(decision.code);
+    }
+    {
+        const std::lock_guard held(lock);
+        requests.emplace(running->request.number, running);
+    }
+    running->request.pending(running->request.packet);
+    const Platform::ErrorCode refusal = driver->Device().Submit(running->transfer);
+    if (refusal != Platform::Errors::Success) {
+        running->transfer.actualLength = 0;
+        Ended(*running, KernelStatus(driver->RefusalOf(refusal)));
+    }
+    return StatusPending;
+}
+
+void StandInFileObject::Ended(Running& running, Status status) {
+    std::shared_ptr<Running> keptToTheEnd;
+    {
+        const std::lock_guard held(lock);
+        const auto found = requests.find(running.request.number);
+        keptToTheEnd = std::move(found->second);
+        requests.erase(found);
+    }
+    running.request.completed(running.request.packet, status, running.transfer.actualLength);
+}
+
+template <class Matches>
+void StandInFileObject::CancelThose(Matches matches) {
+    std::vector<std::shared_ptr<Running>> found;
+    {
+        const std::lock_guard held(lock);
+        for (const auto& [number, running] : requests) {
+            if (matches(number, *running)) {
+                found.push_back(running);
+            }
+        }
+    }
+    for (const auto& running : found) {
+        driver->Device().Cancel(running->transfer);
+    }
+}
+
+void StandInFileObject::Cancel(unsigned long requestNumber) {
+    CancelThose([requestNumber](unsigned long number, const Running&) { return number == requestNumber; });
+}
+
+void StandInFileObject::CancelEndpoint(std::uint8_t endpoint) {
+    CancelThose(
+        [endpoint](unsigned long, const Running& running) { return running.transfer.endpoint == endpoint; });
+}
+
+void StandInFileObject::CancelAll() {
+    CancelThose([](unsigned long, const Running&) { return true; });
+}
+
+std::optional<Status> StandInFileObject::TestControl(std::uint32_t code, std::span<const std::uint8_t> input,
+                                                     std::span<std::uint8_t> output, unsigned long& bytes) {
+    SimulatedInstrument& simulated = instrument->Simulated();
+    const auto answer = [&](const void* data, std::size_t size) {
+        bytes = static_cast<unsigned long>(std::min(size, output.size()));
+        std::memcpy(output.data(), data, bytes);
+    };
+    bytes = 0;
+    switch (code) {
+        case TestControls::PressButton:
+            simulated.PressButton();
+            break;
+        case TestControls::SetFaults:
+            try {
+                instrument->SetFaults(std::string(input.begin(), input.end()));
+            } catch (const std::invalid_argument&) {
+                return KernelStatus(Platform::Errors::InvalidParameter);
+            }
+            break;
+        case TestControls::SetInterfaceVersion:
+            if (input.size() != 2) {
+                return KernelStatus(Platform::Errors::InvalidParameter);
+            }
+            instrument->interfaceVersion = Protocol::LoadLittle16(input.data());
+            break;
+        case TestControls::UseElsewhere:
+            instrument->UseElsewhere(!input.empty() && input[0] != 0);
+            break;
+        case TestControls::ReadEeprom: {
+            const std::vector<std::uint8_t> content = simulated.Eeprom();
+            answer(content.data(), content.size());
+            break;
+        }
+        case TestControls::ReadCounts: {
+            const auto counts = simulated.WithCommands([](const Commands& commands) {
+                return TestControls::Counts{static_cast<std::uint32_t>(commands.measurements),
+                                            static_cast<std::uint32_t>(commands.resets),
+                                            static_cast<std::uint32_t>(commands.buttonReports), 0, 0};
+            });
+            auto full = counts;
+            full.openFiles = static_cast<std::uint32_t>(instrument->OpenFiles());
+            full.pendingTransfers = static_cast<std::uint32_t>(simulated.PendingTransfers());
+            answer(&full, sizeof full);
+            break;
+        }
+        default:
+            return std::nullopt;
+    }
+    return KernelStatus(Platform::Errors::Success);
+}
+
+}  // namespace Varnholt::Simulator

@@ -1,0 +1,52 @@
+#pragma once
+
+#include <map>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <span>
+
+#include "Platform/Drivers/DriverFile.h"
+#include "Platform/Usb/UsbDevice.h"
+#include "StandIn.h"
+#include "StandInInstrument.h"
+
+namespace Varnholt::Simulator {
+
+/// One open file of a stand-in driver and the requests that run on it. Lives until it is closed and its last
+/// request has completed.
+class StandInFileObject final : public std::enable_shared_from_this<StandInFileObject> {
+  public:
+    StandInFileObject(std::shared_ptr<StandInInstrumentObject> opened,
+                      std::unique_ptr<Platform::Drivers::DriverFile> file);
+    ~StandInFileObject();
+    StandInFileObject(const StandInFileObject&) = delete;
+    StandInFileObject& operator=(const StandInFileObject&) = delete;
+
+    Status Read(std::span<std::uint8_t> buffer, const StandInRequest& request, unsigned long& bytes);
+    Status Write(std::span<const std::uint8_t> data, const StandInRequest& request, unsigned long& bytes);
+    Status Control(std::uint32_t code, std::span<const std::uint8_t> input, std::span<std::uint8_t> output,
+                   const StandInRequest& request, unsigned long& bytes);
+
+    void Cancel(unsigned long requestNumber);
+    void CancelEndpoint(std::uint8_t endpoint);
+    void CancelAll();
+
+  private:
+    class Running;
+
+    Status Start(const Platform::Drivers::Decision& decision, const std::shared_ptr<Running>& running,
+                 unsigned long& bytes);
+    void Ended(Running& running, Status status);
+    std::optional<Status> TestControl(std::uint32_t code, std::span<const std::uint8_t> input,
+                                      std::span<std::uint8_t> output, unsigned long& bytes);
+    template <class Matches>
+    void CancelThose(Matches matches);
+
+    const std::shared_ptr<StandInInstrumentObject> instrument;
+    const std::unique_ptr<Platform::Drivers::DriverFile> driver;
+    std::mutex lock;
+    std::map<unsigned long, std::shared_ptr<Running>> requests;  // guarded by lock
+};
+
+}  // namespace Varnholt::Simulator

@@ -1,0 +1,59 @@
+#pragma once
+
+#include <atomic>
+#include <memory>
+#include <mutex>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "Platform/Drivers/DriverFile.h"
+#include "Platform/Drivers/SharedDevice.h"
+#include "Platform/Drivers/UsbIoDevice.h"
+#include "Protocol/UsbIoDriver.h"
+#include "SimulatedInstrument.h"
+
+namespace Varnholt::Simulator {
+
+class StandInFileObject;
+
+/// One plugged-in instrument behind a stand-in driver, with what the driver keeps of it. Lives as long as its
+/// device or a file of it.
+class StandInInstrumentObject final : public Platform::Drivers::EndpointCanceller {
+  public:
+    explicit StandInInstrumentObject(unsigned long index);
+    ~StandInInstrumentObject() override;
+
+    void Unplug();
+    bool IsUnplugged() const { return unplugged; }
+
+    /// What the driver makes of an opening; null with the code in `error`.
+    std::unique_ptr<Platform::Drivers::DriverFile> Open(bool usbIo, std::uint32_t pipe,
+                                                        Platform::ErrorCode& error);
+    void Add(StandInFileObject& file);
+    void Remove(StandInFileObject& file);
+    std::size_t OpenFiles();
+
+    void CancelEndpoint(const Platform::Drivers::SharedDevice& device, std::uint8_t endpoint) override;
+
+    SimulatedInstrument& Simulated();
+    void SetFaults(const std::string& plan);
+    /// Takes effect at the next opening of a device that is not open.
+    void UseElsewhere(bool used);
+
+    std::atomic<std::uint16_t> interfaceVersion = Protocol::UsbIoDriver::InterfaceVersion;
+
+  private:
+    std::vector<std::shared_ptr<StandInFileObject>> Files();
+
+    const std::string name;
+    std::atomic<bool> unplugged = false;
+    std::mutex lock;  // guards what follows
+    std::set<StandInFileObject*> files;
+    std::weak_ptr<Platform::Drivers::SharedDevice> device;
+    std::weak_ptr<Platform::Drivers::UsbIoDevice> usbIoDevice;
+    bool usedElsewhere = false;
+    std::shared_ptr<Platform::Usb::UsbDevice> otherUser;
+};
+
+}  // namespace Varnholt::Simulator

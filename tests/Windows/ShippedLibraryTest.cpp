@@ -1,0 +1,326 @@
+// The shipped library under Wine, on instruments that stand-in kernel drivers present: on 32-bit Windows over
+// the instrument's own driver, on 64-bit Windows over the USBIO driver.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <memory>
+#include <numeric>
+#include <set>
+#include <thread>
+
+#include "ChildProcess.h"
+#include "Interface/Operations.h"
+#include "Platform/DeviceFiles.h"
+#include "Platform/Drivers/DriverFileSystem.h"
+#include "Platform/EventScheduler.h"
+#include "Platform/HostQueries.h"
+#include "ShippedLibrary.h"
+#include "SimulatedBus.h"
+#include "StandInDriver.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using testing::HasSubstr;
+
+std::vector<std::uint8_t> MakeImage(std::uint8_t seed) {
+    std::vector<std::uint8_t> image(OSTRA_IMAGE_SIZE);
+    for (std::size_t i = 0; i < image.size(); ++i) {
+        image[i] = static_cast<std::uint8_t>(i * 7 + i / 256 + seed);
+    }
+    return image;
+}
+
+/// The number of open handles of this process is the same at the end of the object's life as at its
+/// beginning.
+class HandleBalance final {
+  public:
+    HandleBalance() : before(Count()) {}
+    ~HandleBalance() { EXPECT_EQ(Count(), before) << "handles of the process"; }
+    HandleBalance(const HandleBalance&) = delete;
+    HandleBalance& operator=(const HandleBalance&) = delete;
+
+  private:
+    static DWORD Count() {
+        DWORD count = 0;
+        GetProcessHandleCount(GetCurrentProcess(), &count);
+        return count;
+    }
+    const DWORD before;
+};
+
+/// The library and the driver are loaded once; every test begins without an instrument.
+class Shipped : public testing::Test {
+  protected:
+    static void SetUpTestSuite() {
+        driver = std::make_unique<StandInDriver>(StandInDriver::HostIs64Bit() ? usbIoDriver : nativeDriver);
+        library = std::make_unique<ShippedLibrary>();
+        // What the system keeps open from its first use on is no loss of a later call.
+        const std::string path = driver->PlugIn();
+        library->TakeReadout(path);
+        driver->Unplug(path);
+    }
+    static void TearDownTestSuite() {
+        library.reset();
+        driver.reset();
+    }
+    void TearDown() override { driver->UnplugAll(); }
+
+    std::int32_t WriteImage(const std::vector<std::uint8_t>& image, const std::string& instrument) {
+        const HandleBalance balance;
+        return library->WriteImage(image, instrument);
+    }
+    std::int32_t TakeReadout(const std::string& instrument) {
+        const HandleBalance balance;
+        return library->TakeReadout(instrument);
+    }
+
+    static std::unique_ptr<StandInDriver> driver;
+    static std::unique_ptr<ShippedLibrary> library;
+
+  public:
+    static std::string hostWithoutEnumeration, poorSetupApi, nativeDriver, usbIoDriver;
+};
+
+std::unique_ptr<StandInDriver> Shipped::driver;
+std::unique_ptr<ShippedLibrary> Shipped::library;
+std::string Shipped::hostWithoutEnumeration;
+std::string Shipped::poorSetupApi;
+std::string Shipped::nativeDriver;
+std::string Shipped::usbIoDriver;
+
+/// The first readout of the same instrument when everything is in this process.
+std::array<std::int32_t, OSTRA_READOUT_VALUES> ReadoutInProcess(std::uint64_t seed) {
+    Simulator::SimulatedBus bus(Platform::ClockScheduler());
+    Simulator::InstrumentSettings settings;
+    settings.seed = seed;
+    bus.Add("simulated", settings);
+    const auto files = Platform::Drivers::MakeDriverFileSystem(bus);
+    const Platform::ScopedDeviceFiles inForce(*files);
+    std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
+    Interface::TakeReadout(values, "");
+    return values;
+}
+
+TEST_F(Shipped, FunctionsAreFoundByNameAndByOrdinal) {
+    const std::pair<const char*, std::uintptr_t> exports[] = {
+        {"d4fb86cecc88582a", 5}, {"b5ae189db26b2a1b", 6}, {"c288a3930ffaa9d7", 7}, {"f3355d91d5df0e0b", 8}};
+    for (const auto& [name, ordinal] : exports) {
+        const auto byName = GetProcAddress(library->module, name);
+        EXPECT_NE(byName, nullptr) << name;
+        EXPECT_EQ(byName, GetProcAddress(library->module, reinterpret_cast<const char*>(ordinal))) << name;
+    }
+    for (const std::uintptr_t other : {1U, 4U, 9U}) {
+        EXPECT_EQ(GetProcAddress(library->module, reinterpret_cast<const char*>(other)), nullptr);
+    }
+}
+
+TEST_F(Shipped, WithoutInstrumentsThereIsNothingToSay) {
+    EXPECT_EQ(TakeReadout(""), OSTRA_FAILURE);
+    EXPECT_EQ(library->LastError(), "");
+    EXPECT_EQ(WriteImage(MakeImage(1), ""), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_EQ(library->LastError(), "");
+}
+
+TEST_F(Shipped, ReadoutIsTheSameAsInProcess) {
+    const std::string path = driver->PlugIn();
+    ASSERT_EQ(TakeReadout(""), OSTRA_OK) << library->LastError();
+    EXPECT_EQ(library->LastError(), "");
+    EXPECT_GT(std::set<std::int32_t>(library->values.begin(), library->values.end()).size(), 30U);
+    EXPECT_THAT(library->values, testing::ElementsAreArray(ReadoutInProcess(driver->SeedOf(path))));
+    EXPECT_EQ(Instrument(path).Counts().measurements, 1U);
+    EXPECT_EQ(Instrument(path).Counts().resets, 1U);
+}
+
+TEST_F(Shipped, ImageIsWritten) {
+    const std::string path = driver->PlugIn();
+    const std::vector<std::uint8_t> image = MakeImage(3);
+    EXPECT_EQ(WriteImage(image, path), OSTRA_OK) << library->LastError();
+    EXPECT_EQ(Instrument(path).Eeprom(), image);
+}
+
+TEST_F(Shipped, NamedInstrumentIsTaken) {
+    const std::string first = driver->PlugIn();
+    const std::string second = driver->PlugIn();
+    const std::vector<std::uint8_t> before = Instrument(first).Eeprom();
+    EXPECT_EQ(WriteImage(MakeImage(4), second), OSTRA_OK) << library->LastError();
+    EXPECT_EQ(Instrument(second).Eeprom(), MakeImage(4));
+    EXPECT_EQ(Instrument(first).Eeprom(), before);
+
+    EXPECT_EQ(TakeReadout(second), OSTRA_OK);
+    EXPECT_THAT(library->values, testing::ElementsAreArray(ReadoutInProcess(driver->SeedOf(second))));
+
+    EXPECT_EQ(TakeReadout(second + "x"), OSTRA_FAILURE);
+    EXPECT_EQ(library->LastError(), "");
+}
+
+TEST_F(Shipped, TwoProcessesReadTwoInstrumentsAtOnce) {
+    const std::string first = driver->PlugIn();
+    const std::string second = driver->PlugIn();
+    ChildProcess other("readout", second);
+    EXPECT_EQ(TakeReadout(first), OSTRA_OK) << library->LastError();
+    EXPECT_EQ(other.Wait(), OSTRA_OK);
+    EXPECT_EQ(Instrument(second).Counts().measurements, 1U);
+}
+
+TEST_F(Shipped, InstrumentIsPulledOutUnderAReadout) {
+    const std::string path = driver->PlugIn();
+    Instrument(path).SetFaults("bulk-in 0:silent");
+    std::thread puller([&] {
+        while (Instrument(path).Counts().measurements == 0) {
+            Sleep(5);
+        }
+        Sleep(50);
+        driver->Unplug(path);
+    });
+    const DWORD start = GetTickCount();
+    const std::int32_t code = library->TakeReadout(path);
+    const DWORD elapsed = GetTickCount() - start;
+    const std::string text = library->LastError();
+    puller.join();
+    EXPECT_EQ(code, OSTRA_FAILURE);
+    EXPECT_THAT(text, HasSubstr(StandInDriver::HostIs64Bit() ? "E000" : "(1167)"));
+    // Well below what it takes when nobody notices; closing the instrument takes its own time.
+    EXPECT_LT(elapsed, 8000U);
+
+    EXPECT_EQ(TakeReadout(path), OSTRA_FAILURE);
+    EXPECT_EQ(library->LastError(), "");
+    const std::string again = driver->PlugIn();
+    EXPECT_EQ(TakeReadout(again), OSTRA_OK) << library->LastError();
+}
+
+TEST_F(Shipped, UnansweredReadoutEndsInTime) {
+    const std::string path = driver->PlugIn();
+    Instrument(path).SetFaults("bulk-in 0:silent");
+    const DWORD start = GetTickCount();
+    EXPECT_EQ(TakeReadout(path), OSTRA_FAILURE);
+    const DWORD elapsed = GetTickCount() - start;
+    EXPECT_GE(elapsed, 6900U);
+    EXPECT_LT(elapsed, 9000U);
+    EXPECT_EQ(Instrument(path).Counts().pendingTransfers, 0U);
+    EXPECT_EQ(TakeReadout(path), OSTRA_OK) << library->LastError();
+}
+
+TEST_F(Shipped, UntouchedInstrumentIsToldSoAtTheEnd) {
+    const std::string path = driver->PlugIn();
+    EXPECT_EQ(TakeReadout(path), OSTRA_OK);
+    const DWORD untouched = Instrument(path).Counts().buttonReports;
+    std::thread presser([&] {
+        Sleep(300);
+        Instrument(path).PressButton();
+    });
+    EXPECT_EQ(library->TakeReadout(path), OSTRA_OK);
+    presser.join();
+    const DWORD touched = Instrument(path).Counts().buttonReports - untouched;
+    if (StandInDriver::HostIs64Bit()) {
+        EXPECT_EQ(untouched + touched, 0U);
+    } else {
+        EXPECT_EQ(untouched, 1U);
+        EXPECT_EQ(touched, 0U);
+    }
+}
+
+TEST_F(Shipped, InstrumentInUseElsewhereIsPassedOver) {
+    if (!StandInDriver::HostIs64Bit()) {
+        GTEST_SKIP() << "its own driver refuses the opening, and Wine does not pass on a driver's refusal";
+    }
+    const std::string used = driver->PlugIn();
+    const std::string free = driver->PlugIn();
+    Instrument(used).UseElsewhere(true);
+    EXPECT_EQ(TakeReadout(used), OSTRA_FAILURE);
+    EXPECT_EQ(library->LastError(), "");
+    EXPECT_EQ(TakeReadout(""), OSTRA_OK) << library->LastError();
+    EXPECT_EQ(Instrument(free).Counts().measurements, 1U);
+}
+
+TEST_F(Shipped, AnotherProcessHoldsTheInstrument) {
+    if (StandInDriver::HostIs64Bit()) {
+        GTEST_SKIP() << "the named lock belongs to the instrument's own driver";
+    }
+    const std::string path = driver->PlugIn();
+    std::string lockName;
+    std::ranges::copy_if(path, std::back_inserter(lockName),
+                         [](unsigned char c) { return std::isalnum(c) != 0; });
+    for (const char* manner : {"hold-lock", "abandon-lock"}) {
+        SCOPED_TRACE(manner);
+        ChildProcess holder(manner, lockName);
+        ASSERT_TRUE(holder.IsReady());
+        const DWORD start = GetTickCount();
+        EXPECT_EQ(TakeReadout(path), OSTRA_OK) << library->LastError();
+        EXPECT_GE(GetTickCount() - start, ChildProcess::HoldMilliseconds + 900);
+        EXPECT_EQ(holder.Wait(), 0U);
+    }
+}
+
+TEST_F(Shipped, OnlyAUsbIoDriverOfItsVersionIsUsed) {
+    if (!StandInDriver::HostIs64Bit()) {
+        GTEST_SKIP() << "the instrument's own driver tells no version";
+    }
+    const std::string path = driver->PlugIn();
+    const std::pair<WORD, std::int32_t> versions[] = {
+        {0x022F, OSTRA_FAILURE}, {0x0300, OSTRA_FAILURE}, {0x0230, OSTRA_OK}, {0x02FF, OSTRA_OK}};
+    for (const auto& [version, expected] : versions) {
+        Instrument(path).SetInterfaceVersion(version);
+        EXPECT_EQ(TakeReadout(path), expected) << std::hex << version;
+        EXPECT_EQ(library->LastError(), "") << std::hex << version;
+    }
+}
+
+TEST_F(Shipped, LoadingAndUnloadingLeavesNothing) {
+    const std::string path = driver->PlugIn();
+    const HandleBalance balance;
+    for (int round = 0; round < 3; ++round) {
+        ShippedLibrary another;
+        EXPECT_EQ(another.TakeReadout(path), OSTRA_OK) << another.LastError();
+    }
+}
+
+/// Runs the host under another name, for which Wine is told where to get its setupapi from.
+DWORD RunHostWithoutEnumeration(const std::string& folder, const std::string& name,
+                                const std::string& origin) {
+    CreateDirectoryA(folder.c_str(), nullptr);
+    const std::string program = folder + "\\" + name;
+    CopyFileA(Shipped::hostWithoutEnumeration.c_str(), program.c_str(), FALSE);
+    HKEY key = nullptr;
+    RegCreateKeyExA(HKEY_CURRENT_USER, ("Software\\Wine\\AppDefaults\\" + name + "\\DllOverrides").c_str(), 0,
+                    nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr);
+    RegSetValueExA(key, "setupapi", 0, REG_SZ, reinterpret_cast<const BYTE*>(origin.c_str()),
+                   static_cast<DWORD>(origin.size() + 1));
+    RegCloseKey(key);
+    return ChildProcess('"' + program + "\" \"" + ShippedLibrary::path + '"').Wait();
+}
+
+TEST_F(Shipped, SetupApiIsMissing) {
+    const std::string path = driver->PlugIn();
+    EXPECT_EQ(RunHostWithoutEnumeration("C:\\missing", "missing.exe", ""), 0U);
+}
+
+TEST_F(Shipped, SetupApiLacksAnEntryPoint) {
+    const std::string path = driver->PlugIn();
+    CreateDirectoryA("C:\\poor", nullptr);
+    ASSERT_TRUE(CopyFileA(poorSetupApi.c_str(), "C:\\poor\\setupapi.dll", FALSE));
+    EXPECT_EQ(RunHostWithoutEnumeration("C:\\poor", "poor.exe", "native"), 0U);
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests
+
+int main(int argc, char** argv) {
+    using namespace Varnholt::Tests;
+    testing::InitGoogleMock(&argc, argv);
+    if (argc == 4) {
+        ShippedLibrary::path = argv[1];
+        return RunAsChild(argv[2], argv[3]);
+    }
+    if (argc != 6) {
+        std::puts("usage: shipped_library_test LIBRARY HOST SETUPAPI NATIVE-DRIVER USBIO-DRIVER");
+        return 2;
+    }
+    ShippedLibrary::path = argv[1];
+    Shipped::hostWithoutEnumeration = argv[2];
+    Shipped::poorSetupApi = argv[3];
+    Shipped::nativeDriver = argv[4];
+    Shipped::usbIoDriver = argv[5];
+    return RUN_ALL_TESTS();
+}

@@ -1,0 +1,204 @@
+#include "StandInDriver.h"
+
+#include <setupapi.h>
+
+#include <algorithm>
+#include <array>
+#include <cstdio>
+#include <functional>
+#include <stdexcept>
+
+#include "Protocol/NativeDriver.h"
+#include "Protocol/UsbIoDriver.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+constexpr const char* ServiceName = "OstraStandIn";
+constexpr const char* DeviceKeys = "System\\CurrentControlSet\\Enum\\ROOT\\OSTRA";
+/// Asks Wine to look again at the devices below ROOT.
+constexpr DWORD EnumerateRootDevices = 128;
+
+void Check(bool succeeded, const char* what) {
+    if (!succeeded) {
+        throw std::runtime_error(std::string(what) + ": error " + std::to_string(GetLastError()));
+    }
+}
+
+void WaitUntil(const std::function<bool()>& condition, const char* what) {
+    const DWORD start = GetTickCount();
+    while (!condition()) {
+        SetLastError(ERROR_TIMEOUT);
+        Check(GetTickCount() - start < 10'000, what);
+        Sleep(1);
+    }
+}
+
+void DeleteTree(HKEY parent, const char* name) {
+    HKEY key = nullptr;
+    if (RegOpenKeyExA(parent, name, 0, KEY_ALL_ACCESS, &key) == ERROR_SUCCESS) {
+        char child[256];
+        while (RegEnumKeyA(key, 0, child, sizeof child) == ERROR_SUCCESS) {
+            DeleteTree(key, child);
+        }
+        RegCloseKey(key);
+    }
+    RegDeleteKeyA(parent, name);
+}
+
+void WriteDeviceKey(const std::string& name) {
+    HKEY key = nullptr;
+    Check(RegCreateKeyExA(HKEY_LOCAL_MACHINE, (std::string(DeviceKeys) + "\\" + name).c_str(), 0, nullptr, 0,
+                          KEY_ALL_ACCESS, nullptr, &key, nullptr) == ERROR_SUCCESS,
+          "device key");
+    const auto text = [key](const char* value, const std::string& content, DWORD type = REG_SZ) {
+        RegSetValueExA(key, value, 0, type, reinterpret_cast<const BYTE*>(content.c_str()),
+                       static_cast<DWORD>(content.size() + 1));
+    };
+    text("ClassGUID", "{4D36E97D-E325-11CE-BFC1-08002BE10318}");
+    text("Class", "System");
+    text("Service", ServiceName);
+    text("HardwareID", std::string("root\\ostra") + '\0', REG_MULTI_SZ);
+    const DWORD none = 0;
+    RegSetValueExA(key, "ConfigFlags", 0, REG_DWORD, reinterpret_cast<const BYTE*>(&none), sizeof none);
+    RegCloseKey(key);
+}
+
+}  // namespace
+
+StandInDriver::StandInDriver(const std::string& image) {
+    manager = OpenSCManagerA(nullptr, nullptr, SC_MANAGER_ALL_ACCESS);
+    Check(manager != nullptr, "service manager");
+    service = CreateServiceA(manager, ServiceName, ServiceName, SERVICE_ALL_ACCESS, SERVICE_KERNEL_DRIVER,
+                             SERVICE_DEMAND_START, SERVICE_ERROR_NORMAL, image.c_str(), nullptr, nullptr,
+                             nullptr, nullptr, nullptr);
+    Check(service != nullptr, "service");
+    Check(StartServiceA(service, 0, nullptr) != 0, "start of the driver");
+}
+
+StandInDriver::~StandInDriver() {
+    UnplugAll();
+    SERVICE_STATUS status{};
+    ControlService(service, SERVICE_CONTROL_STOP, &status);
+    DeleteService(service);
+    CloseServiceHandle(service);
+    CloseServiceHandle(manager);
+}
+
+bool StandInDriver::HostIs64Bit() {
+    SYSTEM_INFO system{};
+    GetNativeSystemInfo(&system);
+    return system.wProcessorArchitecture == PROCESSOR_ARCHITECTURE_AMD64;
+}
+
+void StandInDriver::Enumerate() {
+    SERVICE_STATUS status{};
+    Check(ControlService(service, EnumerateRootDevices, &status) != 0, "enumeration");
+}
+
+std::string StandInDriver::PlugIn() {
+    char name[8];
+    std::snprintf(name, sizeof name, "%04u", nextDevice++ % 10'000);
+    WriteDeviceKey(name);
+    Enumerate();
+    const std::string part = std::string("#ostra#") + name + "#";
+    std::string path;
+    WaitUntil(
+        [&] {
+            for (const std::string& listed : List()) {
+                if (listed.find(part) != std::string::npos) {
+                    path = listed;
+                }
+            }
+            return !path.empty();
+        },
+        "instrument to be listed");
+    // The driver counts its instruments in the order of their arrival.
+    plugged.push_back({path, name, nextDevice});
+    return path;
+}
+
+void StandInDriver::Unplug(const std::string& path) {
+    const auto found = std::ranges::find(plugged, path, &Device::path);
+    if (found == plugged.end()) {
+        return;
+    }
+    DeleteTree(HKEY_LOCAL_MACHINE, (std::string(DeviceKeys) + "\\" + found->key).c_str());
+    plugged.erase(found);
+    Enumerate();
+    WaitUntil([&] { return std::ranges::count(List(), path) == 0; }, "instrument to be gone");
+}
+
+void StandInDriver::UnplugAll() {
+    while (!plugged.empty()) {
+        Unplug(std::string(plugged.back().path));
+    }
+}
+
+std::uint64_t StandInDriver::SeedOf(const std::string& path) const {
+    const auto found = std::ranges::find(plugged, path, &Device::path);
+    return found == plugged.end() ? 0 : found->seed;
+}
+
+std::vector<std::string> StandInDriver::List() {
+    const Protocol::Guid& interfaceClass =
+        HostIs64Bit() ? Protocol::UsbIoDriver::InterfaceClass : Protocol::NativeDriver::InterfaceClass;
+    const auto* guid = reinterpret_cast<const GUID*>(&interfaceClass);
+    const HDEVINFO list = SetupDiGetClassDevsA(guid, nullptr, nullptr, DIGCF_PRESENT | DIGCF_DEVICEINTERFACE);
+    std::vector<std::string> paths;
+    SP_DEVICE_INTERFACE_DATA record{};
+    record.cbSize = sizeof record;
+    for (DWORD index = 0; SetupDiEnumDeviceInterfaces(list, nullptr, guid, index, &record); ++index) {
+        std::array<char, 1024> buffer{};
+        auto* detail = reinterpret_cast<SP_DEVICE_INTERFACE_DETAIL_DATA_A*>(buffer.data());
+        detail->cbSize = sizeof *detail;
+        if ((record.Flags & SPINT_ACTIVE) != 0 &&
+            SetupDiGetDeviceInterfaceDetailA(list, &record, detail, buffer.size(), nullptr, nullptr)) {
+            paths.emplace_back(detail->DevicePath);
+        }
+    }
+    SetupDiDestroyDeviceInfoList(list);
+    return paths;
+}
+
+Instrument::Instrument(const std::string& path)
+    : file(CreateFileA(path.c_str(), GENERIC_READ | GENERIC_WRITE, FILE_SHARE_READ | FILE_SHARE_WRITE,
+                       nullptr, OPEN_EXISTING, 0, nullptr)) {
+    Check(file != INVALID_HANDLE_VALUE, "instrument");  // NOLINT: the system's macro
+}
+
+DWORD Instrument::Control(DWORD code, const void* input, std::size_t inputSize, void* output,
+                          std::size_t outputSize) {
+    DWORD moved = 0;
+    Check(DeviceIoControl(file, code, const_cast<void*>(input), static_cast<DWORD>(inputSize), output,
+                          static_cast<DWORD>(outputSize), &moved, nullptr) != 0,
+          "test control");
+    return moved;
+}
+
+void Instrument::SetFaults(const std::string& plan) {
+    Control(Simulator::TestControls::SetFaults, plan.data(), plan.size());
+}
+
+void Instrument::SetInterfaceVersion(WORD version) {
+    Control(Simulator::TestControls::SetInterfaceVersion, &version, sizeof version);
+}
+
+void Instrument::UseElsewhere(bool used) {
+    const BYTE value = used ? 1 : 0;
+    Control(Simulator::TestControls::UseElsewhere, &value, sizeof value);
+}
+
+std::vector<BYTE> Instrument::Eeprom() {
+    std::vector<BYTE> content(8192);
+    content.resize(Control(Simulator::TestControls::ReadEeprom, nullptr, 0, content.data(), content.size()));
+    return content;
+}
+
+Simulator::TestControls::Counts Instrument::Counts() {
+    Simulator::TestControls::Counts counts{};
+    Control(Simulator::TestControls::ReadCounts, nullptr, 0, &counts, sizeof counts);
+    return counts;
+}
+
+}  // namespace Varnholt::Tests
