@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cstring>
 #include <iterator>
 #include <list>
 
@@ -315,13 +316,13 @@ void PellandoFunctionality_Win64::StartScan(std::uint32_t, std::uint32_t, std::u
     const Platform::ScopedThreadPriority priority(Platform::HighestThreadPriority);
     VendorOutRequest(Request::Measure, {});
     ReadMeasureData();
-    scanEnd = static_cast<std::uint32_t>(scanData.size());
+    scanEnd = static_cast<std::uint32_t>(scanData.Size());
 }
 TRACED
 
 void PellandoFunctionality_Win64::GetScanData(std::uint8_t* buffer, std::uint32_t* size) try {
     *size = std::min(*size, scanEnd - readPosition);
-    std::copy_n(scanData.begin() + static_cast<std::ptrdiff_t>(readPosition), *size, buffer);
+    std::copy_n(scanData.Data() + readPosition, *size, buffer);
     readPosition += *size;
 }
 TRACED
@@ -331,11 +332,7 @@ void PellandoFunctionality_Win64::PrepareScan(std::uint32_t total) {
     received = 0;
     readPosition = 0;
     scanEnd = 0;
-    const std::size_t size = fixedSize ? total : OpenEndedScanStartSize;
-    if (scanData.capacity() < size) {
-        Bytes().swap(scanData);  // before, not after the new memory is taken
-    }
-    scanData.assign(size, 0);
+    scanData.Reset(fixedSize ? total : OpenEndedScanStartSize);
 }
 
 void PellandoFunctionality_Win64::ReadMeasureData() try {
@@ -348,22 +345,22 @@ void PellandoFunctionality_Win64::ReadMeasureData() try {
     CUsbIoBuffer* current = &a;
     CUsbIoBuffer* next = &b;
     current->NumberOfBytesToTransfer =
-        fixedSize ? static_cast<std::uint32_t>(std::min<std::size_t>(scanData.size(), ScanTransferSize))
+        fixedSize ? static_cast<std::uint32_t>(std::min<std::size_t>(scanData.Size(), ScanTransferSize))
                   : ScanTransferSize;
     readPipe->Read(*current);
     while (ReadMeasureDataInternal(*current, *next)) {
         std::swap(current, next);
     }
-    scanData.resize(received);
+    scanData.Resize(received);
 }
 TRACED
 
 bool PellandoFunctionality_Win64::ReadMeasureDataInternal(CUsbIoBuffer& current, CUsbIoBuffer& next) try {
     next.NumberOfBytesToTransfer = ScanTransferSize;
     const std::uint64_t asked = std::uint64_t{received} + current.NumberOfBytesToTransfer;
-    if (fixedSize && asked <= scanData.size()) {
+    if (fixedSize && asked <= scanData.Size()) {
         next.NumberOfBytesToTransfer =
-            static_cast<std::uint32_t>(std::min<std::uint64_t>(scanData.size() - asked, ScanTransferSize));
+            static_cast<std::uint32_t>(std::min<std::uint64_t>(scanData.Size() - asked, ScanTransferSize));
     }
     // Where it cannot be started, the wait for it will tell.
     readPipe->Read(next);
@@ -387,19 +384,19 @@ void PellandoFunctionality_Win64::CopyDataToBufferInternal(const CUsbIoBuffer& b
         return;
     }
     const std::uint64_t end = std::uint64_t{received} + count;
-    if (scanData.capacity() < end) {
+    if (scanData.Capacity() < end) {
         if (fixedSize) {
             throw DataException("buffer size is fix", Here());
         }
-        scanData.reserve(scanData.size() * 2);
+        scanData.Reserve(std::max(std::uint64_t{scanData.Size()} * 2, end));
     }
-    if (fixedSize ? scanData.size() < end : end > MaximumScanSize) {
-        throw DataException("more bytes read than expected", Here());
+    if (scanData.Size() < end) {
+        if (fixedSize || end > MaximumScanSize) {
+            throw DataException("more bytes read than expected", Here());
+        }
+        scanData.Resize(static_cast<std::size_t>(end));
     }
-    const auto* const source = static_cast<const std::uint8_t*>(buffer.Buffer);
-    const std::size_t inPlace = std::min<std::size_t>(count, scanData.size() - received);
-    std::copy_n(source, inPlace, scanData.begin() + static_cast<std::ptrdiff_t>(received));
-    scanData.insert(scanData.end(), source + inPlace, source + count);
+    std::memcpy(scanData.Data() + received, buffer.Buffer, count);
     received = static_cast<std::uint32_t>(end);
 }
 TRACED

@@ -4,6 +4,7 @@
 
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionalityByte.h"
 #include "DeviceDriver/Ostra/LowLevel/Win64/InterruptListener_Win64.h"
+#include "DeviceDriver/Ostra/LowLevel/Win64/ScanBuffer.h"
 #include "Protocol/Instrument.h"
 #include "UsbIo/CUsbIoPipe.h"
 
@@ -86,7 +87,7 @@ class PellandoFunctionality_Win64 final : public PellandoFunctionalityByte {
     Varnholt::Utilities::Tools::SmartPointer<InterruptListener_Win64> interruptListener;
     std::string devicePath;
 
-    Bytes scanData;                  ///< of the last scan
+    ScanBuffer scanData;             ///< of the last scan
     std::uint32_t received = 0;      ///< bytes of `scanData` that the running scan has filled
     std::uint32_t readPosition = 0;  ///< next byte that `GetScanData` hands out
     std::uint32_t scanEnd = 0;       ///< bytes that it can hand out
