@@ -46,7 +46,8 @@ void BareLoop::Finish(Chunk& chunk) {
 
 void BareLoop::Read(std::uint64_t total, std::vector<std::uint8_t>& result) {
     control.transfer.endpoint = 0;
-    control.transfer.setup = {Protocol::VendorOut, static_cast<std::uint8_t>(Protocol::Request::Measure), 0, 0, 0};
+    control.transfer.setup = {Protocol::VendorOut, static_cast<std::uint8_t>(Protocol::Request::Measure), 0,
+                              0, 0};
     Start(control, 0);
     Finish(control);
 
