@@ -11,15 +11,15 @@ namespace Varnholt::Bench {
 
 inline constexpr std::uint32_t ChunkSize = 65536;
 
-/// What a scan is compared with: the same two 64 KiB transfers in flight on the same device, each copied once into
-/// one result buffer, without the library.
+/// What a scan is compared with: the same two 64 KiB transfers in flight on the same device, each copied once
+/// into one result buffer, without the library.
 class BareLoop final : private Platform::Usb::TransferClient {
   public:
     explicit BareLoop(Platform::Usb::UsbDevice& usbDevice);
     ~BareLoop() override;
 
-    /// Starts a measurement and reads until a transfer does not become full, or `total` bytes (0: no limit) came.
-    /// `result` grows as needed.
+    /// Starts a measurement and reads until a transfer does not become full, or `total` bytes (0: no limit)
+    /// came. `result` grows as needed.
     void Read(std::uint64_t total, std::vector<std::uint8_t>& result);
 
   private:

@@ -1,4 +1,5 @@
-/* A host program in C: loads the library, writes an EEPROM image if one is given, takes a readout and shows it.
+/* A host program in C: loads the library, writes an EEPROM image if one is given, takes a readout and shows
+ * it.
  *
  *     readout LIBRARY [INSTRUMENT [IMAGE-FILE]]
  *
@@ -33,7 +34,8 @@ int main(int argc, char** argv) {
     TakeReadout takeReadout;
     GetInformation getInformation;
     if (!library || !LOAD(library, writeImage, "f3355d91d5df0e0b") ||
-        !LOAD(library, takeReadout, "d4fb86cecc88582a") || !LOAD(library, getInformation, "b5ae189db26b2a1b")) {
+        !LOAD(library, takeReadout, "d4fb86cecc88582a") ||
+        !LOAD(library, getInformation, "b5ae189db26b2a1b")) {
         fprintf(stderr, "usage: %s LIBRARY [INSTRUMENT [IMAGE-FILE]]\n", argv[0]);
         return 2;
     }
