@@ -136,11 +136,11 @@ bool PellandoEAT::IsEntryInLogArea(std::uint16_t id, std::uint32_t count) const 
 TRACED
 
 void PellandoEAT::EnsureConsistency(const Properties& set) try {
-    const Properties before = datastore;
+    Backup before;
     try {
-        MoveFor(set, 0);
+        MoveFor(set, 0, before);
     } catch (...) {
-        datastore = before;
+        Restore(before);
         throw;
     }
 }
@@ -148,20 +148,26 @@ TRACED
 
 void PellandoEAT::EnsureConsistency(const PellandoLog& log) try {
     const Properties& set = log.GetItems();
-    const Properties before = datastore;
+    Backup before;
     try {
-        MoveFor(set, 0);
+        MoveFor(set, 0, before);
         if (Holds(set, EepromMap::LogCopyIdOffset)) {
-            MoveFor(set, EepromMap::LogCopyIdOffset);
+            MoveFor(set, EepromMap::LogCopyIdOffset, before);
         }
     } catch (...) {
-        datastore = before;
+        Restore(before);
         throw;
     }
 }
 TRACED
 
-void PellandoEAT::MoveFor(const Properties& set, std::uint16_t idOffset) {
+void PellandoEAT::Restore(Backup& before) {
+    if (before) {
+        std::swap(datastore, *before);
+    }
+}
+
+void PellandoEAT::MoveFor(const Properties& set, std::uint16_t idOffset, Backup& before) {
     const auto& values = set.GetDatastore();
     if (values.empty()) {
         return;
@@ -175,6 +181,9 @@ void PellandoEAT::MoveFor(const Properties& set, std::uint16_t idOffset) {
             static_cast<std::int64_t>(value->second.SizeOf()) - SizeOf(WithOffset(value->first, idOffset));
         if (difference == 0) {
             continue;
+        }
+        if (!before) {
+            before = datastore;
         }
         for (auto later = std::next(value); later != values.end(); ++later) {
             Move(WithOffset(later->first, idOffset), difference);

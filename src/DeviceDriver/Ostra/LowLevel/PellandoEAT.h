@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <vector>
 
 #include "DeviceDriver/Generic/Configuration/Properties.h"
@@ -79,8 +80,12 @@ class PellandoEAT final {
     static const Properties& GetDefaultLogData();
 
   private:
-    void MoveFor(const Properties& set, std::uint16_t idOffset);
+    /// Keeps a copy of the datastore for the case that something fails, made before the first change: mostly
+    /// there is none.
+    using Backup = std::optional<Properties>;
+    void MoveFor(const Properties& set, std::uint16_t idOffset, Backup& before);
     void Move(std::uint16_t id, std::int64_t difference);
+    void Restore(Backup& before);
 
     std::uint16_t version = 0;
     std::uint16_t length = 0;
