@@ -21,7 +21,10 @@ endforeach()
 add_library(ostra_options INTERFACE)
 target_include_directories(ostra_options INTERFACE "${PROJECT_SOURCE_DIR}/src" "${PROJECT_SOURCE_DIR}/include")
 target_compile_options(ostra_options INTERFACE
-  -Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion -Wshadow -Wcast-align -Wformat=2 -Werror
+  -Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion
+  # Clang also takes a name for shadowing when it repeats a field of the class that encloses a nested one.
+  $<$<C_COMPILER_ID:GNU>:-Wshadow>
+  -Wcast-align -Wformat=2 -Werror
   $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor -Woverloaded-virtual -Wold-style-cast -Wextra-semi>
   # GCC 12 takes what std::string copies inside itself for an overlap when it optimises.
   $<$<AND:$<CXX_COMPILER_ID:GNU>,$<CONFIG:Release>>:-Wno-restrict>

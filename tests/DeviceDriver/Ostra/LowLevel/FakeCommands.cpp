@@ -112,7 +112,9 @@ class FakeCommands final : public PellandoFunctionalityByte {
   private:
     void Receive(const char* name, std::uint32_t address = 0, std::uint32_t size = 0) {
         instrument.commands.push_back({name, address, size});
-        if (instrument.commands.size() - 1 == instrument.failingCommand) {
+        const std::size_t index = instrument.commands.size() - 1;
+        if (index == instrument.failingCommand ||
+            (index > instrument.failingCommand && instrument.isGoneAfterFailure)) {
             throw IOException("the fake fails", Here());
         }
     }

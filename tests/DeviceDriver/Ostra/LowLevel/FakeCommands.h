@@ -39,6 +39,8 @@ struct FakeInstrument {
     /// The command with this index fails with `IOException`; a write has then written this part of its bytes.
     std::size_t failingCommand = ~std::size_t{0};
     std::uint32_t bytesWrittenByFailure = 0;
+    /// Every command behind the failing one fails as well, and nothing is written any more.
+    bool isGoneAfterFailure = false;
 
     std::vector<Command> TakeCommands();
 };

@@ -5,12 +5,14 @@
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
 #include "FakeCommands.h"
+#include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 namespace EepromMap = Protocol::EepromMap;
 using Generic::Configuration::Properties;
+using Generic::Configuration::Property;
 using Generic::Utilities::DataException;
 using Varnholt::Utilities::Exceptions::ResourceException;
 
@@ -77,9 +79,14 @@ bool HasSecondLog(PellandoEEPROM& eeprom) {
     return true;
 }
 
+Property Resized(Property value, std::uint16_t elements) {
+    value.Assign(Bytes(Property::ElementSize * elements, 0x41), true);
+    return value;
+}
+
 }  // namespace
 
-ImageOutcome CheckImage(const Bytes& image) {
+ImageOutcome CheckImage(const Bytes& image, const std::vector<Resize>& resizes) {
     FakeInstrument instrument{.eeprom = image, .commands = {}, .describeMode = {}};
     const auto functionality = Open(instrument);
     Varnholt::Utilities::Tools::SmartPointer<PellandoEEPROM> eeprom;
@@ -90,7 +97,12 @@ ImageOutcome CheckImage(const Bytes& image) {
         return ImageOutcome::Refused;
     }
     Bytes dumped;
-    if (!Succeeds("dump", [&] { dumped = eeprom->Dump(); })) {
+    if (!Succeeds("dump", [&] {
+            for (const Resize& resize : resizes) {
+                eeprom->SetProperty(resize.id, Resized(eeprom->GetProperty(resize.id), resize.elements));
+            }
+            dumped = eeprom->Dump();
+        })) {
         return ImageOutcome::DumpRefused;
     }
     const Values expected = ValuesOf(*eeprom);  // behind the dump, which renews the checksum
@@ -104,6 +116,33 @@ ImageOutcome CheckImage(const Bytes& image) {
         }
     }
     return ImageOutcome::RoundTripRight;
+}
+
+ImageOutcome CheckRecords(const std::uint8_t* records, std::size_t size) {
+    static const Bytes fresh = FreshImage();
+    static const std::vector<std::uint16_t> ids = [] {
+        std::vector<std::uint16_t> all;
+        for (const Properties* set :
+             {&PellandoEAT::GetDefaultLogData(), &PellandoEAT::GetDefaultCalibrationData()}) {
+            for (const auto& entry : set->GetDatastore()) {
+                all.push_back(entry.first);
+            }
+        }
+        return all;
+    }();
+    constexpr std::size_t recordSize = 4;
+    Bytes image = fresh;
+    std::vector<Resize> resizes;
+    for (; size >= recordSize; size -= recordSize, records += recordSize) {
+        const std::uint16_t place = Protocol::LoadBig16(records);
+        const std::uint16_t number = Protocol::LoadBig16(records + 2);
+        if (place + sizeof(number) <= image.size()) {
+            Protocol::StoreBig16(&image[place], number);
+        } else {
+            resizes.push_back({ids[place % ids.size()], static_cast<std::uint16_t>(number % 2048)});
+        }
+    }
+    return CheckImage(image, resizes);
 }
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -1,7 +1,7 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
-#include <string>
 #include <vector>
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
@@ -9,12 +9,23 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 /// What became of an image of 8192 bytes.
 enum class ImageOutcome {
     Refused,        ///< cannot be loaded, with a documented exception
-    DumpRefused,    ///< was loaded and read; dumping it is refused, with a documented exception
+    DumpRefused,    ///< was loaded and read; changing or dumping it is refused, with a documented exception
     RoundTripRight  ///< the dump was loaded again and holds the same values, in both copies of the log
 };
 
-/// Loads the image as an instrument's EEPROM, reads every value, dumps it and loads the dump. Anything that
-/// is not one of the outcomes throws `std::logic_error` with what went wrong.
-ImageOutcome CheckImage(const std::vector<std::uint8_t>& image);
+/// Gives the value a new number of elements, so that the dump must make room.
+struct Resize {
+    std::uint16_t id;
+    std::uint16_t elements;
+};
+
+/// Loads the image as an instrument's EEPROM, resizes values, reads every value, dumps it and loads the dump.
+/// Anything that is not one of the outcomes throws `std::logic_error` with what went wrong.
+ImageOutcome CheckImage(const std::vector<std::uint8_t>& image, const std::vector<Resize>& resizes = {});
+
+/// The image and the resizes that a short text of bytes stands for: records of 4 bytes, two big-endian
+/// numbers. A record whose first number is below 8192 puts its second into a fresh image at that address; any
+/// other first number picks the value that is to have as many elements as the second says.
+ImageOutcome CheckRecords(const std::uint8_t* records, std::size_t size);
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -50,5 +50,29 @@ TEST(MutatedImages, GiveAModelThatRoundTripsOrADocumentedException) {
     }
 }
 
+TEST(MutatedImages, ValuesOfAnySizeRoundTripOrAreRefused) {
+    std::array<int, 3> outcomes{};
+    for (std::uint32_t seed = 0; seed < OSTRA_MUTATED_IMAGES / 10; ++seed) {
+        std::minstd_rand random(seed + 1);
+        Bytes records;
+        for (auto count = random() % 4; count-- > 0;) {
+            const auto value = static_cast<std::uint8_t>(random() % 40);
+            const auto elements = random() % 8 == 0 ? random() % 1000 : random() % 6;
+            // 32 times 256 and more picks a value, not an address.
+            records.insert(records.end(),
+                           {static_cast<std::uint8_t>(33 + random() % 200), value,
+                            static_cast<std::uint8_t>(elements >> 8), static_cast<std::uint8_t>(elements)});
+        }
+        try {
+            ++outcomes[static_cast<std::size_t>(CheckRecords(records.data(), records.size()))];
+        } catch (const std::exception& exception) {
+            FAIL() << "seed " << seed << ": " << exception.what();
+        }
+    }
+    EXPECT_EQ(outcomes[0], 0) << "a fresh image can be loaded";
+    EXPECT_GT(outcomes[1], 0);
+    EXPECT_GT(outcomes[2], outcomes[1]);
+}
+
 }  // namespace
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel
