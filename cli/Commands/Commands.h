@@ -18,6 +18,12 @@ void AddIdentify(CLI::App& app, Session& session);
 void AddReset(CLI::App& app, Session& session);
 void AddMonitor(CLI::App& app, Session& session);
 void AddWriteImage(CLI::App& app, Session& session);
+void AddEeprom(CLI::App& app, Session& session);
+void AddCalibration(CLI::App& app, Session& session);
+void AddLog(CLI::App& app, Session& session);
+void AddRam(CLI::App& app, Session& session);
+void AddBinary(CLI::App& app, Session& session);
+void AddWord(CLI::App& app, Session& session);
 
 /// On Linux only; see SystemCommands.h.
 void AddRegister(CLI::App& app, Session& session);
@@ -27,8 +33,10 @@ using AddCommand = void (*)(CLI::App& app, Session& session);
 
 /// The commands in the order in which the help lists them.
 inline constexpr std::array Commands{
-    AddCommand{AddList},  AddCommand{AddReadout}, AddCommand{AddScan},       AddCommand{AddIdentify},
-    AddCommand{AddReset}, AddCommand{AddMonitor}, AddCommand{AddWriteImage},
+    AddCommand{AddList},        AddCommand{AddReadout}, AddCommand{AddScan},       AddCommand{AddIdentify},
+    AddCommand{AddReset},       AddCommand{AddMonitor}, AddCommand{AddWriteImage}, AddCommand{AddEeprom},
+    AddCommand{AddCalibration}, AddCommand{AddLog},     AddCommand{AddRam},        AddCommand{AddBinary},
+    AddCommand{AddWord},
 };
 
 }  // namespace Varnholt::Cli

@@ -1,0 +1,70 @@
+#include "Commands/CommandLine.h"
+#include "Commands/Commands.h"
+#include "Memory/ImageEdit.h"
+#include "Memory/MemoryTarget.h"
+#include "Output/AtomicFile.h"
+#include "Protocol/EepromMap.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+struct GetOptions {
+    MemoryOptions memory;
+    std::string file;
+};
+
+void Get(Session& session, const GetOptions& options) {
+    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+    const std::vector<std::uint8_t> block = BinaryBlockOf(target.Image());
+    WriteFileAtomically(options.file, block);
+    if (options.memory.json) {
+        session.Print({{"source", target.Name()}, {"file", options.file}, {"bytes", block.size()}});
+    } else {
+        session.Out() << block.size() << " bytes of " << target.Name() << " written to " << options.file
+                      << '\n';
+    }
+}
+
+struct PutOptions {
+    MemoryOptions memory;
+    ChangeOptions change;
+    std::string file;
+};
+
+void Put(Session& session, const PutOptions& options) {
+    const std::vector<std::uint8_t> block = ReadWholeFile(options.file, Protocol::EepromMap::BinarySize);
+    // Before an instrument is opened: the file may be the wrong one.
+    WithBinaryBlock(EepromImage(Protocol::EepromSize), block);
+    MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
+    const MemoryTarget::Outcome outcome =
+        target.Change(WithBinaryBlock(target.Image(), block), options.change, Granularity::Elements);
+    if (options.memory.json) {
+        Json result = target.JsonOf(outcome);
+        result["file"] = options.file;
+        session.Print(result);
+    } else {
+        session.Out() << MemoryTarget::TextOf(outcome, target.Name()) << '\n';
+    }
+}
+
+}  // namespace
+
+void AddBinary(CLI::App& app, Session& session) {
+    CLI::App* const group = app.add_subcommand("binary", "read and write the binary block of 1904 bytes");
+    group->require_subcommand(1);
+
+    const auto get = std::make_shared<GetOptions>();
+    CLI::App* command = group->add_subcommand("get", "save the binary block in a file");
+    command->add_option("FILE", get->file, "is replaced when complete")->required();
+    AddMemoryOptions(command, get->memory);
+    SetAction(command, session, get, Get);
+
+    const auto put = std::make_shared<PutOptions>();
+    command = group->add_subcommand("put", "write the binary block from a file");
+    command->add_option("FILE", put->file, "1904 bytes")->required();
+    AddChangeOptions(command, put->change);
+    AddMemoryOptions(command, put->memory);
+    SetAction(command, session, put, Put);
+}
+
+}  // namespace Varnholt::Cli

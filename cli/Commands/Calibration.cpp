@@ -1,0 +1,81 @@
+#include <fmt/format.h>
+
+#include "Commands/CommandLine.h"
+#include "Commands/Commands.h"
+#include "Memory/ImageEdit.h"
+#include "Memory/ImageModel.h"
+#include "Memory/MemoryTarget.h"
+#include "Output/Table.h"
+#include "Output/ValueList.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+struct ShowOptions {
+    MemoryOptions memory;
+};
+
+void Show(Session& session, const ShowOptions& options) {
+    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+    ImageModel model(target.Image());
+    if (options.memory.json) {
+        session.Print({{"source", target.Name()}, {"calibration", JsonOf(model.Calibration())}});
+    } else {
+        PrintValues(session, model.Calibration(), Vectors::Numbers);
+    }
+}
+
+struct SetOptions {
+    MemoryOptions memory;
+    ChangeOptions change;
+    std::vector<std::string> assignments;
+};
+
+void Set(Session& session, const SetOptions& options) {
+    const std::vector<Assignment> assignments = ParseAssignments(options.assignments);
+    MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
+    const EditedImage edited = WithCalibration(target.Image(), assignments);
+    const MemoryTarget::Outcome outcome = target.Change(edited.image, options.change, Granularity::Elements);
+    if (options.memory.json) {
+        Json changes = Json::array();
+        for (const ValueChange& change : edited.changes) {
+            changes.push_back(
+                {{"id", change.id}, {"before", JsonOf(change.before)}, {"after", JsonOf(change.after)}});
+        }
+        Json result = target.JsonOf(outcome);
+        result["changes"] = changes;
+        session.Print(result);
+        return;
+    }
+    Table table({{"ID", Table::Align::Right}, {"BEFORE"}, {}, {"AFTER"}});
+    for (const ValueChange& change : edited.changes) {
+        table.AddRow({std::to_string(change.id), TextOf(change.before), "->", TextOf(change.after)});
+    }
+    table.Print(session.Out());
+    session.Out() << MemoryTarget::TextOf(outcome, target.Name()) << '\n';
+}
+
+}  // namespace
+
+void AddCalibration(CLI::App& app, Session& session) {
+    CLI::App* const group = app.add_subcommand("calibration", "show and set calibration values");
+    group->require_subcommand(1);
+
+    const auto show = std::make_shared<ShowOptions>();
+    CLI::App* command = group->add_subcommand("show", "show the calibration values");
+    AddMemoryOptions(command, show->memory);
+    SetAction(command, session, show, Show);
+
+    const auto set = std::make_shared<SetOptions>();
+    command = group->add_subcommand(
+        "set",
+        "set calibration values: the EEPROM is read, changed as a whole and proven, backed up, written "
+        "where it differs, and read back");
+    command->add_option("ID=VALUE", set->assignments, "new values; elements with commas: 1000=0.5,1.5")
+        ->required();
+    AddChangeOptions(command, set->change);
+    AddMemoryOptions(command, set->memory);
+    SetAction(command, session, set, Set);
+}
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,145 @@
+#include <fmt/format.h>
+
+#include "Commands/CommandLine.h"
+#include "Commands/Commands.h"
+#include "Commands/Eeprom.h"
+#include "Memory/ImageCheck.h"
+#include "Memory/ImageModel.h"
+#include "Memory/MemoryTarget.h"
+#include "Output/AtomicFile.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+struct BackupOptions {
+    MemoryOptions memory;
+    std::string file;
+};
+
+void Backup(Session& session, const BackupOptions& options) {
+    Instrument instrument(session, options.memory.instrument);
+    const EepromImage image = ReadEepromTwice(session, instrument);
+    WriteFileAtomically(options.file, image);
+    const bool isSane = IsSane(CheckImage(image));
+    if (!isSane) {
+        session.Warn("the EEPROM holds what the driver cannot use; `ostra eeprom check " + options.file +
+                     "` says what");
+    }
+    if (options.memory.json) {
+        session.Print({{"identifier", instrument.Identifier()},
+                       {"file", options.file},
+                       {"bytes", image.size()},
+                       {"sane", isSane}});
+    } else {
+        session.Out() << instrument.Identifier() << ": " << image.size() << " bytes written to "
+                      << options.file << '\n';
+    }
+}
+
+struct WriteOptions {
+    MemoryOptions memory;
+    ChangeOptions change;
+    std::string file;
+    bool force = false;
+};
+
+/// Refuses an image that the driver cannot use, unless that is wanted.
+void CheckBeforeWriting(Session& session, const WriteOptions& options, const EepromImage& image) {
+    std::string errors;
+    for (const ImageFinding& finding : CheckImage(image)) {
+        if (finding.severity == ImageFinding::Severity::Error) {
+            errors += (errors.empty() ? "" : "; ") + finding.area + ": " + finding.text;
+        }
+    }
+    if (errors.empty()) {
+        return;
+    }
+    if (!options.force) {
+        throw ToolFailure(
+            ExitCode::BadData, options.file + " is not written: " + errors,
+            "`ostra eeprom check " + options.file + "` tells all; --force writes it all the same");
+    }
+    session.Warn(options.file + ": " + errors);
+}
+
+void WriteOrRestore(Session& session, const WriteOptions& options, const ChangeOptions& change) {
+    const EepromImage image = ReadImageFile(options.file);
+    CheckBeforeWriting(session, options, image);
+    MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
+    const MemoryTarget::Outcome outcome = target.Change(image, change, Granularity::Pieces);
+    if (options.memory.json) {
+        Json result = target.JsonOf(outcome);
+        result["file"] = options.file;
+        session.Print(result);
+    } else {
+        session.Out() << MemoryTarget::TextOf(outcome, target.Name()) << '\n';
+    }
+}
+
+void Write(Session& session, const WriteOptions& options) {
+    WriteOrRestore(session, options, options.change);
+}
+
+void Restore(Session& session, const WriteOptions& options) {
+    // What there is now is what somebody wants to be rid of.
+    ChangeOptions change = options.change;
+    change.noBackup = change.backupFile.empty();
+    WriteOrRestore(session, options, change);
+}
+
+void New(Session& session, const BackupOptions& options) {
+    const EepromImage image = FreshImage();
+    WriteFileAtomically(options.file, image);
+    if (options.memory.json) {
+        session.Print({{"file", options.file}, {"bytes", image.size()}});
+    } else {
+        session.Out() << "the image of a fresh instrument written to " << options.file << '\n';
+    }
+}
+
+void AddWriteOptions(CLI::App* command, const std::shared_ptr<WriteOptions>& options) {
+    command->add_option("FILE", options->file, "image of 8192 bytes")->required();
+    command->add_flag("--force", options->force, "write an image that the driver cannot use")
+        ->group("Change");
+    AddChangeOptions(command, options->change);
+    AddInstrumentOptions(command, options->memory.instrument);
+    AddJsonFlag(command, options->memory.json);
+}
+
+}  // namespace
+
+void AddEepromTransfers(CLI::App& group, Session& session) {
+    const auto backup = std::make_shared<BackupOptions>();
+    CLI::App* command = group.add_subcommand("backup", "save the EEPROM of an instrument in a file");
+    command->add_option("FILE", backup->file, "is replaced when the backup is complete")->required();
+    AddInstrumentOptions(command, backup->memory.instrument);
+    AddJsonFlag(command, backup->memory.json);
+    SetAction(command, session, backup, Backup);
+
+    const auto write = std::make_shared<WriteOptions>();
+    command = group.add_subcommand(
+        "write", "write an image the safe way: check it, make a backup, write what differs, read it back");
+    AddWriteOptions(command, write);
+    SetAction(command, session, write, Write);
+
+    const auto restore = std::make_shared<WriteOptions>();
+    command = group.add_subcommand("restore", "write a backup back (as `write`, without a new backup)");
+    AddWriteOptions(command, restore);
+    SetAction(command, session, restore, Restore);
+
+    const auto fresh = std::make_shared<BackupOptions>();
+    command = group.add_subcommand("new", "make the image of a fresh instrument");
+    command->add_option("FILE", fresh->file, "is replaced when the image is complete")->required();
+    AddJsonFlag(command, fresh->memory.json);
+    SetAction(command, session, fresh, New);
+}
+
+void AddEeprom(CLI::App& app, Session& session) {
+    CLI::App* const group =
+        app.add_subcommand("eeprom", "back up, write, restore, show, check and compare EEPROM images");
+    group->require_subcommand(1);
+    AddEepromTransfers(*group, session);
+    AddEepromViews(*group, session);
+}
+
+}  // namespace Varnholt::Cli

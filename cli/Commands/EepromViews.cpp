@@ -1,0 +1,263 @@
+#include <fmt/format.h>
+#include <fmt/ostream.h>
+
+#include <algorithm>
+
+#include "Commands/CommandLine.h"
+#include "Commands/Eeprom.h"
+#include "Memory/ImageCheck.h"
+#include "Memory/ImageDiff.h"
+#include "Memory/ImageEdit.h"
+#include "Memory/ImageModel.h"
+#include "Memory/MemoryTarget.h"
+#include "Output/Table.h"
+#include "Output/ValueList.h"
+#include "Protocol/ByteOrder.h"
+#include "Protocol/EepromMap.h"
+#include "Protocol/PropertyIdentifiers.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+namespace Map = Protocol::EepromMap;
+namespace Ids = Protocol::PropertyIds;
+
+struct ViewOptions {
+    MemoryOptions memory;
+    bool numbers = false;
+};
+
+/// The view commands take the image as their argument.
+void AddViewOptions(CLI::App* command, const std::shared_ptr<ViewOptions>& options) {
+    auto* const file = command->add_option("FILE", options->memory.imageFile,
+                                           "image file (default: the EEPROM of an instrument)");
+    AddInstrumentOptions(command, options->memory.instrument);
+    file->excludes("--device")->excludes("--transport");
+    AddJsonFlag(command, options->memory.json);
+}
+
+ImageModel ModelOf(const MemoryTarget& target) {
+    try {
+        return ImageModel(target.Image());
+    } catch (const Utilities::Exceptions::RuntimeException& exception) {
+        throw ToolFailure(ExitCode::BadData, target.Name() + ": " + exception.what(),
+                          "`ostra eeprom check` tells what is wrong with it");
+    }
+}
+
+Json JsonOfCopy(const LogCopy& copy) {
+    return {{"readable", copy.isReadable},
+            {"valid", copy.isValid},
+            {"stored", copy.stored},
+            {"calculated", copy.calculated}};
+}
+
+Json JsonOfImage(const MemoryTarget& target, ImageModel& model, const LogCopies& copies) {
+    Json entries = Json::array();
+    for (const auto& [id, address] : model.Table().GetDatastore()) {
+        entries.push_back({{"id", id}, {"address", address.AsLong()}});
+    }
+    Json words = Json::object();
+    for (std::uint16_t id = Ids::FirstRawWord; id <= LastWritableRawWord; ++id) {
+        words[std::to_string(id)] = RawWordOf(target.Image(), id);
+    }
+    const std::uint8_t* const header = target.Image().data() + Map::Table;
+    return {{"source", target.Name()},
+            {"table",
+             {{"version", Protocol::LoadBig16(header + Map::TableLayout::Version)},
+              {"length", Protocol::LoadBig16(header + Map::TableLayout::Length)},
+              {"entries", entries}}},
+            {"calibration", JsonOf(model.Calibration())},
+            {"log",
+             {{"used", copies.Used()},
+              {"main", JsonOfCopy(copies.main)},
+              {"second", JsonOfCopy(copies.second)},
+              {"values", JsonOf(model.Log())}}},
+            {"binary", HexOf(BinaryBlockOf(target.Image()))},
+            {"words", words}};
+}
+
+void PrintRawAreas(Session& session, const EepromImage& image) {
+    const std::vector<std::uint8_t> block = BinaryBlockOf(image);
+    const auto used = block.size() - static_cast<std::size_t>(std::count(block.begin(), block.end(), 0xFF));
+    fmt::print(session.Out(), "\nBINARY BLOCK (10100): {}\n",
+               used == 0 ? "empty" : fmt::format("{} of {} bytes used", used, block.size()));
+    session.Out() << "RAW WORDS (10200 to 10215):\n";
+    constexpr std::uint16_t inARow = 8;
+    for (std::uint16_t first = Ids::FirstRawWord; first <= LastWritableRawWord; first += inARow) {
+        fmt::print(session.Out(), "{:>6}:", first);
+        for (std::uint16_t i = 0; i < inARow; ++i) {
+            fmt::print(session.Out(), " {:08X}", RawWordOf(image, static_cast<std::uint16_t>(first + i)));
+        }
+        session.Out() << '\n';
+    }
+}
+
+void Show(Session& session, const ViewOptions& options) {
+    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+    ImageModel model = ModelOf(target);
+    const LogCopies copies = ReadLogCopies(target.Image());
+    if (options.memory.json) {
+        session.Print(JsonOfImage(target, model, copies));
+        return;
+    }
+    const Vectors vectors = options.numbers ? Vectors::Numbers : Vectors::Plotted;
+    const std::string used = copies.main.isValid || copies.second.isValid
+                                 ? std::string("from the ") + copies.Used()
+                                 : "both copies are damaged: empty";
+    fmt::print(session.Out(), "{}: allocation table of {} entries\n\nCALIBRATION\n", target.Name(),
+               model.Table().GetItemCount());
+    PrintValues(session, model.Calibration(), vectors);
+    fmt::print(session.Out(), "\nUSAGE LOG ({})\n", used);
+    PrintValues(session, model.Log(), vectors);
+    PrintRawAreas(session, target.Image());
+}
+
+void Check(Session& session, const ViewOptions& options) {
+    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+    const std::vector<ImageFinding> findings = CheckImage(target.Image());
+    const bool isSane = IsSane(findings);
+    if (options.memory.json) {
+        Json list = Json::array();
+        for (const ImageFinding& finding : findings) {
+            list.push_back(
+                {{"severity", NameOf(finding.severity)}, {"area", finding.area}, {"text", finding.text}});
+        }
+        session.Print({{"source", target.Name()}, {"sane", isSane}, {"findings", list}});
+    } else {
+        Table table({{}, {}, {}});
+        for (const ImageFinding& finding : findings) {
+            table.AddRow({NameOf(finding.severity), finding.area, finding.text});
+        }
+        table.Print(session.Out());
+        session.Out() << target.Name() << (isSane ? " can be used\n" : " cannot be used as it is\n");
+    }
+    if (!isSane) {
+        throw ToolFailure(ExitCode::BadData, target.Name() + " has errors");
+    }
+}
+
+struct DiffOptions {
+    MemoryOptions memory;
+    std::string a, b;
+};
+
+std::string TextOfSide(const std::optional<Property>& value, bool isWord) {
+    if (!value) {
+        return "(none)";
+    }
+    if (isWord) {
+        return fmt::format("0x{:08X}", static_cast<std::uint32_t>(value->AsLong()));
+    }
+    return TextOf(*value);
+}
+
+std::string TextOfDifference(const ImageDiff::Value& value) {
+    if (value.a && value.b && IsLongVector(*value.a) && IsLongVector(*value.b)) {
+        const std::vector<double> a = NumbersOf(*value.a);
+        const std::vector<double> b = NumbersOf(*value.b);
+        if (a.size() == b.size()) {
+            std::size_t different = 0, first = 0;
+            for (std::size_t i = a.size(); i-- > 0;) {
+                if (a[i] != b[i]) {
+                    ++different;
+                    first = i;
+                }
+            }
+            return fmt::format("{} of {} elements, the first at {}: {} -> {}", different, a.size(), first,
+                               a[first], b[first]);
+        }
+    }
+    const bool isWord = value.kind == "word";
+    return TextOfSide(value.a, isWord) + " -> " + TextOfSide(value.b, isWord);
+}
+
+void PrintDiff(Session& session, const ImageDiff& diff, const std::string& a, const std::string& b) {
+    if (diff.IsEmpty()) {
+        fmt::print(session.Out(), "{} and {} are the same\n", a, b);
+        return;
+    }
+    if (!diff.unreadable.empty()) {
+        session.Warn("calibration and log cannot be compared: " + diff.unreadable);
+    }
+    Table values({{"WHAT"}, {"ID", Table::Align::Right}, {"DIFFERENCE"}});
+    for (const ImageDiff::Value& value : diff.values) {
+        values.AddRow({value.kind, std::to_string(value.id), TextOfDifference(value)});
+    }
+    if (!values.IsEmpty()) {
+        values.Print(session.Out());
+        session.Out() << '\n';
+    }
+    Table areas({{"AREA"}, {"ADDRESSES"}, {"BYTES", Table::Align::Right}, {"FIRST AT", Table::Align::Right}});
+    for (const ImageDiff::Area& area : diff.areas) {
+        areas.AddRow({area.name, fmt::format("{} to {}", area.first, area.last),
+                      std::to_string(area.different), std::to_string(area.firstDifference)});
+    }
+    areas.Print(session.Out());
+}
+
+void Diff(Session& session, const DiffOptions& options) {
+    const EepromImage a = ReadImageFile(options.a);
+    MemoryOptions other = options.memory;
+    other.imageFile = options.b;
+    const MemoryTarget b(session, other, MemoryTarget::Use::Read);
+    const ImageDiff diff = Compare(a, b.Image());
+    if (options.memory.json) {
+        Json values = Json::array();
+        for (const ImageDiff::Value& value : diff.values) {
+            values.push_back({{"kind", value.kind},
+                              {"id", value.id},
+                              {"a", value.a ? JsonOf(*value.a) : Json(nullptr)},
+                              {"b", value.b ? JsonOf(*value.b) : Json(nullptr)}});
+        }
+        Json areas = Json::array();
+        for (const ImageDiff::Area& area : diff.areas) {
+            areas.push_back({{"area", area.name},
+                             {"first", area.first},
+                             {"last", area.last},
+                             {"differentBytes", area.different},
+                             {"firstDifference", area.firstDifference}});
+        }
+        session.Print({{"a", options.a},
+                       {"b", b.Name()},
+                       {"same", diff.IsEmpty()},
+                       {"unreadable", diff.unreadable.empty() ? Json(nullptr) : Json(diff.unreadable)},
+                       {"values", values},
+                       {"areas", areas}});
+    } else {
+        PrintDiff(session, diff, options.a, b.Name());
+    }
+    if (!diff.IsEmpty()) {
+        throw ToolFailure(ExitCode::Different, options.a + " and " + b.Name() + " differ");
+    }
+}
+
+}  // namespace
+
+void AddEepromViews(CLI::App& group, Session& session) {
+    const auto show = std::make_shared<ViewOptions>();
+    CLI::App* command = group.add_subcommand("show", "show what is in an EEPROM or an image");
+    command->add_flag("--numbers", show->numbers, "show vectors as numbers, not as plots")->group("Output");
+    AddViewOptions(command, show);
+    SetAction(command, session, show, Show);
+
+    const auto check = std::make_shared<ViewOptions>();
+    command = group.add_subcommand(
+        "check", "check table, logs, checksums and areas, and tell what the driver would use of them");
+    AddViewOptions(command, check);
+    SetAction(command, session, check, Check);
+
+    const auto diff = std::make_shared<DiffOptions>();
+    command = group.add_subcommand("diff",
+                                   "compare two images, or an image and an instrument, by value and "
+                                   "by area; exit code 9 when they differ");
+    command->add_option("A", diff->a, "image file")->required();
+    auto* const other =
+        command->add_option("B", diff->b, "image file (default: the EEPROM of an instrument)");
+    AddInstrumentOptions(command, diff->memory.instrument);
+    other->excludes("--device")->excludes("--transport");
+    AddJsonFlag(command, diff->memory.json);
+    SetAction(command, session, diff, Diff);
+}
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,148 @@
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <array>
+
+#include "Commands/CommandLine.h"
+#include "Commands/Commands.h"
+#include "Memory/PropertyText.h"
+#include "Memory/RamAccess.h"
+#include "Output/Table.h"
+#include "Output/ValueList.h"
+#include "Protocol/PropertyIdentifiers.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+namespace Ids = Protocol::PropertyIds;
+
+struct Meaning {
+    std::uint16_t id;
+    const char* text;
+    bool isSettable;
+};
+constexpr std::array Meanings{
+    Meaning{Ids::IntegrationTime, "integration time, seconds", true},
+    Meaning{Ids::SecondTime, "second time, seconds", true},
+    Meaning{Ids::ThirdParameter, "third parameter, at most 256", true},
+    Meaning{Ids::FlagBit0, "flag, bit 0", true},
+    Meaning{Ids::FlagBit1, "flag, bit 1", true},
+    Meaning{Ids::FlagBit2, "flag, bit 2", true},
+    Meaning{Ids::FlagBit3, "flag, bit 3", true},
+    Meaning{Ids::ThirdParameterReplacement, "in the place of 2010, with 2008", true},
+    Meaning{Ids::FifthParameter, "fifth parameter", false},
+    Meaning{Ids::Misc1, "MISC m1", false},
+    Meaning{Ids::Misc2, "MISC m2", false},
+    Meaning{Ids::Misc3, "MISC m3", false},
+    Meaning{Ids::Misc4, "MISC m4", false},
+    Meaning{Ids::Misc5, "MISC m5", false},
+    Meaning{Ids::FirstOfMisc2, "from MISC m2", false},
+    Meaning{Ids::SecondOfMisc2, "from MISC m2", false},
+};
+
+const Meaning* MeaningOf(std::uint16_t id) {
+    const auto* const found = std::find_if(Meanings.begin(), Meanings.end(),
+                                           [id](const Meaning& meaning) { return meaning.id == id; });
+    return found == Meanings.end() ? nullptr : found;
+}
+
+struct ShowOptions {
+    InstrumentOptions instrument;
+    bool json = false;
+};
+
+void PrintSet(Session& session, const RamAccess::Properties& set) {
+    Table table({{"ID", Table::Align::Right}, {"VALUE"}, {"MEANING"}});
+    for (const auto& [id, value] : set.GetDatastore()) {
+        const Meaning* const meaning = MeaningOf(id);
+        table.AddRow({std::to_string(id), TextOf(value), meaning != nullptr ? meaning->text : "not loaded"});
+    }
+    table.Print(session.Out());
+}
+
+void Show(Session& session, const ShowOptions& options) {
+    Instrument instrument(session, options.instrument);
+    const auto set = RamAccess(instrument).Load();
+    if (options.json) {
+        session.Print({{"identifier", instrument.Identifier()}, {"ram", JsonOf(set)}});
+    } else {
+        PrintSet(session, set);
+    }
+}
+
+struct SetOptions {
+    InstrumentOptions instrument;
+    std::vector<std::string> assignments;
+    bool dryRun = false;
+    bool json = false;
+};
+
+RamAccess::Properties Changed(const RamAccess::Properties& loaded,
+                              const std::vector<Assignment>& assignments) {
+    auto set = loaded;
+    for (const Assignment& assignment : assignments) {
+        const Meaning* const meaning = MeaningOf(assignment.id);
+        if (meaning == nullptr || !meaning->isSettable) {
+            throw ToolFailure(ExitCode::Usage, fmt::format("{} cannot be set", assignment.id),
+                              "2000, 2001, 2002, 2003, 2008, 2009, 2010 and 9189 can");
+        }
+        set.SetProperty(assignment.id, ParseValue(assignment, set.GetProperty(assignment.id)));
+    }
+    return set;
+}
+
+void Set(Session& session, const SetOptions& options) {
+    const std::vector<Assignment> assignments = ParseAssignments(options.assignments);
+    Instrument instrument(session, options.instrument);
+    RamAccess ram(instrument);
+    const auto before = ram.Load();
+    auto set = Changed(before, assignments);
+    if (!options.dryRun) {
+        ram.Store(set);
+        // What the instrument made of it: times are rounded to what its mode can count.
+        set = ram.Load();
+    }
+    Json changes = Json::array();
+    Table table({{"ID", Table::Align::Right}, {"BEFORE"}, {}, {"AFTER"}, {"MEANING"}});
+    for (const Assignment& assignment : assignments) {
+        const Property& old = before.GetProperty(assignment.id);
+        const Property& now = set.GetProperty(assignment.id);
+        changes.push_back({{"id", assignment.id}, {"before", JsonOf(old)}, {"after", JsonOf(now)}});
+        table.AddRow(
+            {std::to_string(assignment.id), TextOf(old), "->", TextOf(now), MeaningOf(assignment.id)->text});
+    }
+    if (options.json) {
+        session.Print(
+            {{"identifier", instrument.Identifier()}, {"dryRun", options.dryRun}, {"changes", changes}});
+        return;
+    }
+    table.Print(session.Out());
+    if (options.dryRun) {
+        session.Out() << "nothing was set (the instrument rounds times to what its mode can count)\n";
+    }
+}
+
+}  // namespace
+
+void AddRam(CLI::App& app, Session& session) {
+    CLI::App* const group = app.add_subcommand("ram", "show and set volatile parameters of an instrument");
+    group->require_subcommand(1);
+
+    const auto show = std::make_shared<ShowOptions>();
+    CLI::App* command = group->add_subcommand("show", "show the volatile parameters");
+    AddInstrumentOptions(command, show->instrument);
+    AddJsonFlag(command, show->json);
+    SetAction(command, session, show, Show);
+
+    const auto set = std::make_shared<SetOptions>();
+    command = group->add_subcommand(
+        "set",
+        "set measurement parameters; chooses the measurement mode that can count the integration time");
+    command->add_option("ID=VALUE", set->assignments, "new values, for example 2009=0.05")->required();
+    command->add_flag("--dry-run", set->dryRun, "show what would be set and set nothing")->group("Change");
+    AddInstrumentOptions(command, set->instrument);
+    AddJsonFlag(command, set->json);
+    SetAction(command, session, set, Set);
+}
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,106 @@
+#include <fmt/format.h>
+
+#include <limits>
+
+#include "Commands/CommandLine.h"
+#include "Commands/Commands.h"
+#include "Memory/ImageEdit.h"
+#include "Memory/MemoryTarget.h"
+#include "Output/Table.h"
+#include "Protocol/PropertyIdentifiers.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+struct GetOptions {
+    MemoryOptions memory;
+    std::vector<std::uint16_t> ids;
+};
+
+void Get(Session& session, const GetOptions& options) {
+    std::vector<std::uint16_t> ids = options.ids;
+    if (ids.empty()) {
+        for (std::uint16_t id = Protocol::PropertyIds::FirstRawWord; id <= LastWritableRawWord; ++id) {
+            ids.push_back(id);
+        }
+    }
+    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+    Json words = Json::object();
+    Table table({{"ID", Table::Align::Right}, {"WORD"}, {"", Table::Align::Right}});
+    for (const std::uint16_t id : ids) {
+        const std::uint32_t word = RawWordOf(target.Image(), id);
+        words[std::to_string(id)] = word;
+        table.AddRow({std::to_string(id), fmt::format("0x{:08X}", word), std::to_string(word)});
+    }
+    if (options.memory.json) {
+        session.Print({{"source", target.Name()}, {"words", words}});
+    } else {
+        table.Print(session.Out());
+    }
+}
+
+struct PutOptions {
+    MemoryOptions memory;
+    ChangeOptions change;
+    std::vector<std::string> assignments;
+};
+
+void Put(Session& session, const PutOptions& options) {
+    struct Word {
+        std::uint16_t id;
+        std::uint32_t value;
+    };
+    std::vector<Word> words;
+    for (const Assignment& assignment : ParseAssignments(options.assignments)) {
+        std::uint64_t value = 0;
+        if (!ParseNumber(assignment.value, std::numeric_limits<std::uint32_t>::max(), value)) {
+            throw ToolFailure(ExitCode::Usage, "'" + assignment.value + "' is no 32-bit number",
+                              "for example 10200=0x01020304");
+        }
+        words.push_back({assignment.id, static_cast<std::uint32_t>(value)});
+    }
+    MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
+    EepromImage edited = target.Image();
+    Json changes = Json::array();
+    Table table({{"ID", Table::Align::Right}, {"BEFORE"}, {}, {"AFTER"}});
+    for (const Word& word : words) {
+        const std::uint32_t before = RawWordOf(edited, word.id);
+        SetRawWord(edited, word.id, word.value);
+        changes.push_back({{"id", word.id}, {"before", before}, {"after", word.value}});
+        table.AddRow({std::to_string(word.id), fmt::format("0x{:08X}", before), "->",
+                      fmt::format("0x{:08X}", word.value)});
+    }
+    const MemoryTarget::Outcome outcome = target.Change(edited, options.change, Granularity::Elements);
+    if (options.memory.json) {
+        Json result = target.JsonOf(outcome);
+        result["changes"] = changes;
+        session.Print(result);
+    } else {
+        table.Print(session.Out());
+        session.Out() << MemoryTarget::TextOf(outcome, target.Name()) << '\n';
+    }
+}
+
+}  // namespace
+
+void AddWord(CLI::App& app, Session& session) {
+    CLI::App* const group =
+        app.add_subcommand("word", "read and write raw words of the EEPROM, 4 bytes each");
+    group->require_subcommand(1);
+
+    const auto get = std::make_shared<GetOptions>();
+    CLI::App* command = group->add_subcommand("get", "show raw words");
+    command->add_option("ID", get->ids,
+                        "10200 to 10239 (default: 10200 to 10215; those behind are the table's)");
+    AddMemoryOptions(command, get->memory);
+    SetAction(command, session, get, Get);
+
+    const auto put = std::make_shared<PutOptions>();
+    command = group->add_subcommand("put", "write raw words");
+    command->add_option("ID=VALUE", put->assignments, "words 10200 to 10215, decimal or 0x...")->required();
+    AddChangeOptions(command, put->change);
+    AddMemoryOptions(command, put->memory);
+    SetAction(command, session, put, Put);
+}
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,136 @@
+#include "Memory/ImageEdit.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+
+#include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
+#include "Failure.h"
+#include "Memory/ImageModel.h"
+#include "Protocol/ByteOrder.h"
+#include "Protocol/EepromMap.h"
+#include "Protocol/PropertyIdentifiers.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+using DeviceDriver::Generic::Configuration::Properties;
+using DeviceDriver::Ostra::LowLevel::ConfigurationDataConverter;
+namespace Map = Protocol::EepromMap;
+namespace Ids = Protocol::PropertyIds;
+
+static_assert(Map::RawWords + (LastWritableRawWord + 1U - Ids::FirstRawWord) * Map::RawWordSize ==
+              Map::EndOfLogArea);
+
+bool HaveSameBytes(const Properties& a, const Properties& b) {
+    const auto& left = a.GetDatastore();
+    const auto& right = b.GetDatastore();
+    return std::equal(left.begin(), left.end(), right.begin(), right.end(),
+                      [](const auto& one, const auto& other) {
+                          return one.first == other.first &&
+                                 one.second.AsByteVector(true) == other.second.AsByteVector(true);
+                      });
+}
+
+void CopyRange(const EepromImage& from, EepromImage& to, std::size_t first, std::size_t count) {
+    const auto offset = static_cast<std::ptrdiff_t>(first);
+    std::copy_n(from.begin() + offset, count, to.begin() + offset);
+}
+
+[[noreturn]] void RefuseOddTable() {
+    throw ToolFailure(
+        ExitCode::BadData,
+        "the allocation table puts values where the change would reach others; nothing was changed",
+        "`ostra eeprom check` shows what is wrong with the image");
+}
+
+std::uint32_t AddressOfWord(std::uint16_t id, std::uint16_t last) {
+    if (id < Ids::FirstRawWord || id > last) {
+        throw ToolFailure(ExitCode::Usage, fmt::format("{} is no raw word", id),
+                          fmt::format("raw words are {} to {}", Ids::FirstRawWord, last));
+    }
+    return Map::RawWords + (std::uint32_t{id} - Ids::FirstRawWord) * Map::RawWordSize;
+}
+
+}  // namespace
+
+EditedImage WithCalibration(const EepromImage& image, const std::vector<Assignment>& assignments) {
+    ImageModel model(image);
+    EditedImage edited{image, {}};
+    for (const Assignment& assignment : assignments) {
+        if (!ConfigurationDataConverter::IsCalibrationParameter(assignment.id)) {
+            throw ToolFailure(ExitCode::Usage, fmt::format("{} is no calibration value", assignment.id),
+                              "`ostra calibration show` lists them");
+        }
+        const Property before = model.Get().GetProperty(assignment.id);
+        const Property after = ParseValue(assignment, before);
+        model.Get().SetProperty(assignment.id, after);
+        edited.changes.push_back({assignment.id, before, after});
+    }
+    const Properties wanted = model.Calibration();
+    const EepromImage dumped = model.Get().Dump();
+    // The dump holds the log as the driver would use it, and nothing in the areas beside the table: of it
+    // only table and calibration are taken.
+    CopyRange(dumped, edited.image, Map::Table,
+              Protocol::LoadBig16(&dumped[Map::Table + Map::TableLayout::Length]));
+    CopyRange(dumped, edited.image, Map::Calibration, wanted.SizeOf(true));
+    ImageModel proof(edited.image);
+    if (!HaveSameBytes(proof.Calibration(), wanted) || !HaveSameBytes(proof.Log(), ImageModel(image).Log())) {
+        RefuseOddTable();
+    }
+    return edited;
+}
+
+EepromImage WithEmptyLog(const EepromImage& image) {
+    ImageModel model(image);
+    const Properties items = model.Log();
+    if (items.SizeOf(true) > Map::LogSize) {
+        RefuseOddTable();  // it would reach into the binary block
+    }
+    for (const auto& [id, value] : items.GetDatastore()) {
+        model.Get().SetProperty(id, ConfigurationDataConverter::GetDefaultProperty(id));
+    }
+    model.Get().DumpLog();
+    const EepromImage edited = model.Contents();
+    ImageModel proof(edited);
+    const LogCopies copies = ReadLogCopies(edited);
+    const Properties& wanted = model.Log();
+    if (!copies.main.isValid || !HaveSameBytes(copies.main.items, wanted) ||
+        (copies.second.isReadable && !HaveSameBytes(copies.second.items, wanted)) ||
+        !HaveSameBytes(proof.Calibration(), ImageModel(image).Calibration())) {
+        RefuseOddTable();
+    }
+    return edited;
+}
+
+std::vector<std::uint8_t> BinaryBlockOf(const EepromImage& image) {
+    const std::span<const std::uint8_t> bytes(image);
+    const auto first = bytes.subspan(Map::BinaryFirst, Map::BinaryFirstSize);
+    const auto second = bytes.subspan(Map::BinarySecond, Map::BinarySecondSize);
+    std::vector<std::uint8_t> block(first.begin(), first.end());
+    block.insert(block.end(), second.begin(), second.end());
+    return block;
+}
+
+EepromImage WithBinaryBlock(const EepromImage& image, std::span<const std::uint8_t> block) {
+    if (block.size() != Map::BinarySize) {
+        throw ToolFailure(ExitCode::BadData,
+                          fmt::format("the binary block has {} bytes, not {}{}", Map::BinarySize,
+                                      block.size() > Map::BinarySize ? "more than " : "",
+                                      std::min<std::size_t>(block.size(), Map::BinarySize)));
+    }
+    EepromImage edited = image;
+    std::ranges::copy(block.first(Map::BinaryFirstSize), edited.begin() + Map::BinaryFirst);
+    std::ranges::copy(block.subspan(Map::BinaryFirstSize), edited.begin() + Map::BinarySecond);
+    return edited;
+}
+
+std::uint32_t RawWordOf(const EepromImage& image, std::uint16_t id) {
+    return Protocol::LoadBig32(&image[AddressOfWord(id, Ids::LastRawWord)]);
+}
+
+void SetRawWord(EepromImage& image, std::uint16_t id, std::uint32_t word) {
+    Protocol::StoreBig32(&image[AddressOfWord(id, LastWritableRawWord)], word);
+}
+
+}  // namespace Varnholt::Cli

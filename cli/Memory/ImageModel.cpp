@@ -1,0 +1,87 @@
+#include "Memory/ImageModel.h"
+
+#include <utility>
+
+#include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoEAT.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoLog.h"
+#include "DeviceDriver/Ostra/LowLevel/SectionReader.h"
+#include "Memory/ImageTransport.h"
+#include "Protocol/EepromMap.h"
+#include "Protocol/PropertyIdentifiers.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+using namespace DeviceDriver::Ostra::LowLevel;
+using DeviceDriver::Generic::Configuration::Properties;
+using Utilities::Tools::SmartPointer;
+namespace EepromMap = Protocol::EepromMap;
+namespace Ids = Protocol::PropertyIds;
+
+constexpr std::uint8_t UnusedByte = 0xFF;
+
+LogCopy ReadCopy(const PellandoEAT& table, const EepromImage& image, std::uint16_t idOffset) {
+    LogCopy copy;
+    try {
+        PellandoLog log(table, image.begin());
+        log.ParseBuffer(table, image.data(), idOffset);
+        copy.isValid = log.HasValidChecksum();
+        copy.stored = static_cast<std::uint32_t>(log.GetItem(Ids::LogChecksum).AsLong());
+        copy.calculated = log.CalculateChecksum();
+        copy.items = log.GetItems();
+        copy.isReadable = true;
+    } catch (const Utilities::Exceptions::RuntimeException&) {
+        copy.isValid = false;  // the table does not hold it
+    }
+    return copy;
+}
+
+}  // namespace
+
+ImageModel::ImageModel(EepromImage image) : contents(std::move(image)) {
+    const SmartPointer<PellandoFunctionalityByte> transport(new ImageTransport(contents));
+    const SmartPointer<PellandoFunctionality> commands(new PellandoFunctionality(transport));
+    memory = std::make_unique<PellandoEEPROM>(commands);
+}
+
+Properties ImageModel::LoadSet(const char* name) {
+    Properties set(name);
+    return memory->Load(set);
+}
+
+Properties ImageModel::Calibration() {
+    return LoadSet("CalibrationData");
+}
+
+Properties ImageModel::Log() {
+    return LoadSet("LogData");
+}
+
+Properties ImageModel::Table() {
+    return LoadSet("EATData");
+}
+
+const char* LogCopies::Used() const {
+    return main.isValid ? "main copy" : second.isValid ? "second copy" : "an empty log";
+}
+
+LogCopies ReadLogCopies(const EepromImage& image) {
+    const PellandoEAT table(image.begin() + EepromMap::Table);
+    return {ReadCopy(table, image, 0), ReadCopy(table, image, EepromMap::LogCopyIdOffset)};
+}
+
+EepromImage FreshImage() {
+    EepromImage image(Protocol::EepromSize, UnusedByte);
+    const auto at = [&image](std::uint32_t address) { return image.begin() + std::ptrdiff_t{address}; };
+    PellandoEAT table;
+    table.InitializeEmtpyEAT();
+    table.Dump(at(EepromMap::Table), at(EepromMap::Calibration));
+    const Properties& log = PellandoEAT::GetDefaultLogData();
+    log.Dump(at(EepromMap::MainLog), at(EepromMap::LogCopy), true, true);
+    log.Dump(at(EepromMap::LogCopy), at(EepromMap::EndOfLogArea), true, true);
+    PellandoEAT::GetDefaultCalibrationData().Dump(at(EepromMap::Calibration), image.end(), true, true);
+    return image;
+}
+
+}  // namespace Varnholt::Cli

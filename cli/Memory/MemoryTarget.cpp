@@ -1,0 +1,132 @@
+#include "Memory/MemoryTarget.h"
+
+#include <fmt/format.h>
+
+#include <filesystem>
+
+#include "Commands/CommandLine.h"
+#include "Memory/ImageCheck.h"
+#include "Output/AtomicFile.h"
+#include "Platform/Time.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+/// A name that tells instrument and time, and that no file has yet.
+std::string NewBackupName(const std::string& identifier) {
+    std::string name = ShortNameOf(identifier);
+    for (char& c : name) {
+        const bool isPlain = (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
+                             c == '-' || c == '.' || c == '_';
+        c = isPlain ? c : '_';
+    }
+    const Platform::CalendarTime now = Platform::LocalCalendarTime(Platform::WallClockNow().seconds);
+    const std::string base = fmt::format("ostra-{}-{:04}{:02}{:02}-{:02}{:02}{:02}", name, now.year,
+                                         now.month, now.day, now.hour, now.minute, now.second);
+    std::error_code error;
+    for (int number = 1;; ++number) {
+        const std::string candidate = base + (number == 1 ? "" : fmt::format("-{}", number)) + ".eeprom";
+        if (!std::filesystem::exists(candidate, error)) {
+            return candidate;
+        }
+    }
+}
+
+std::uint32_t CountDifferences(const EepromImage& a, const EepromImage& b) {
+    std::uint32_t count = 0;
+    for (std::size_t i = 0; i < a.size(); ++i) {
+        count += a[i] != b[i] ? 1U : 0U;
+    }
+    return count;
+}
+
+}  // namespace
+
+void AddMemoryOptions(CLI::App* command, MemoryOptions& options) {
+    AddInstrumentOptions(command, options.instrument);
+    command->add_option("--image", options.imageFile, "work on this image file instead of an instrument")
+        ->type_name("FILE")
+        ->excludes("--device")
+        ->excludes("--transport")
+        ->group("Instrument");
+    AddJsonFlag(command, options.json);
+}
+
+void AddChangeOptions(CLI::App* command, ChangeOptions& options) {
+    const char* const group = "Change";
+    command->add_flag("--dry-run", options.dryRun, "show what would be done and do nothing")->group(group);
+    command
+        ->add_option("--backup", options.backupFile,
+                     "file for the instrument's earlier content; must not exist (default: a new name)")
+        ->type_name("FILE")
+        ->group(group);
+    command->add_flag("--no-backup", options.noBackup, "make no backup")->excludes("--backup")->group(group);
+}
+
+MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, Use use)
+    : session(usedSession), file(options.imageFile) {
+    if (!file.empty()) {
+        name = file;
+        image = ReadImageFile(file);
+        return;
+    }
+    instrument.emplace(
+        session, options.instrument,
+        use == Use::Change ? Instrument::Choice::MustBeNamed : Instrument::Choice::FirstWillDo);
+    name = instrument->Identifier();
+    image = use == Use::Change ? ReadEepromTwice(session, *instrument) : ReadEeprom(session, *instrument);
+}
+
+std::string MemoryTarget::MakeBackup(const ChangeOptions& options) const {
+    if (options.noBackup) {
+        return {};
+    }
+    const std::string backup = options.backupFile.empty() ? NewBackupName(name) : options.backupFile;
+    WriteFileAtomically(backup, image, AtomicFile::IfItExists::Refuse);
+    session.Note("backup of " + name + " written to " + backup);
+    return backup;
+}
+
+std::string MemoryTarget::WayBack(const std::string& backup) const {
+    if (backup.empty()) {
+        return "there is no backup: write an image with `ostra eeprom write FILE`";
+    }
+    return fmt::format("this brings back what was there before: ostra eeprom restore {} --device {}{}",
+                       backup, ShortNameOf(name), IsSane(CheckImage(image)) ? "" : " --force");
+}
+
+MemoryTarget::Outcome MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& options,
+                                           Granularity granularity) {
+    Outcome outcome{options.dryRun, CountDifferences(image, wanted), 0, {}};
+    if (instrument) {
+        const std::vector<WritePiece> pieces = PiecesToWrite(image, wanted, granularity);
+        outcome.pieces = pieces.size();
+        if (!options.dryRun && !pieces.empty()) {
+            outcome.backup = MakeBackup(options);
+            WriteEeprom(session, *instrument, wanted, pieces, WayBack(outcome.backup));
+        }
+    } else if (!options.dryRun && outcome.bytes > 0) {
+        WriteFileAtomically(file, wanted);
+    }
+    return outcome;
+}
+
+std::string MemoryTarget::TextOf(const Outcome& outcome, const std::string& name) {
+    if (outcome.bytes == 0) {
+        return name + " holds this already; nothing to write";
+    }
+    const std::string pieces = outcome.pieces > 0 ? fmt::format(" in {} pieces", outcome.pieces) : "";
+    return outcome.dryRun ? fmt::format("{} bytes of {} would be changed{}", outcome.bytes, name, pieces)
+                          : fmt::format("{} bytes of {} changed{}{}", outcome.bytes, name, pieces,
+                                        outcome.pieces > 0 ? ", read back and compared" : "");
+}
+
+Json MemoryTarget::JsonOf(const Outcome& outcome) const {
+    return {{"target", name},
+            {"dryRun", outcome.dryRun},
+            {"changedBytes", outcome.bytes},
+            {"pieces", outcome.pieces},
+            {"backup", outcome.backup.empty() ? Json(nullptr) : Json(outcome.backup)}};
+}
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,72 @@
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "Memory/EepromWrite.h"
+
+namespace CLI {
+class App;
+}
+
+namespace Varnholt::Cli {
+
+/// What a memory command works on: an instrument, or an image file instead.
+struct MemoryOptions {
+    InstrumentOptions instrument;
+    std::string imageFile;
+    bool json = false;
+};
+
+/// How a memory command changes it.
+struct ChangeOptions {
+    bool dryRun = false;
+    bool noBackup = false;
+    std::string backupFile;  ///< empty: a name is made up
+};
+
+/// --image FILE beside --device, --transport and --json.
+void AddMemoryOptions(CLI::App* command, MemoryOptions& options);
+/// --dry-run, --backup and --no-backup.
+void AddChangeOptions(CLI::App* command, ChangeOptions& options);
+
+/// The content of an EEPROM, where it came from, and the way back to there.
+class MemoryTarget final {
+  public:
+    enum class Use { Read, Change };
+
+    /// Reads it; an instrument is opened for the object's life.
+    MemoryTarget(Session& session, const MemoryOptions& options, Use use);
+
+    /// The instrument's identifier or the file's name.
+    const std::string& Name() const { return name; }
+    const EepromImage& Image() const { return image; }
+
+    /// What a change did, or with a dry run would have done.
+    struct Outcome {
+        bool dryRun = false;
+        std::uint32_t bytes = 0;  ///< that differ
+        std::size_t pieces = 0;   ///< written to an instrument
+        std::string backup;       ///< file with the earlier content; empty: none was made
+    };
+    /// Makes the content `wanted`. A file is replaced as a whole. Of an instrument a backup is made, only
+    /// what differs is written, and all is read back.
+    Outcome Change(const EepromImage& wanted, const ChangeOptions& options, Granularity granularity);
+
+    /// As the user reads it.
+    static std::string TextOf(const Outcome& outcome, const std::string& name);
+    Json JsonOf(const Outcome& outcome) const;
+
+  private:
+    std::string MakeBackup(const ChangeOptions& options) const;
+    std::string WayBack(const std::string& backup) const;
+
+    Session& session;
+    std::string file;
+    std::optional<Instrument> instrument;
+    std::string name;
+    EepromImage image;
+};
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,67 @@
+#include "Output/ValueList.h"
+
+#include <fmt/format.h>
+#include <fmt/ostream.h>
+
+#include <algorithm>
+
+#include "Memory/PropertyText.h"
+#include "Output/Table.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+using DeviceDriver::Generic::Configuration::Properties;
+
+constexpr int PlotHeight = 8;
+constexpr std::size_t NumbersInARow = 8;
+
+void PrintNumbers(std::ostream& out, const std::vector<double>& numbers) {
+    for (std::size_t row = 0; row < numbers.size(); row += NumbersInARow) {
+        fmt::print(out, "{:>5}:", row);
+        for (std::size_t i = row; i < std::min(row + NumbersInARow, numbers.size()); ++i) {
+            fmt::print(out, " {:>10}", numbers[i]);
+        }
+        out << '\n';
+    }
+}
+
+}  // namespace
+
+void PrintValues(Session& session, const Properties& values, Vectors vectors) {
+    Table table({{"ID", Table::Align::Right}, {"VALUE"}});
+    for (const auto& [id, value] : values.GetDatastore()) {
+        table.AddRow({std::to_string(id), IsLongVector(value)
+                                              ? fmt::format("{} elements, below", NumbersOf(value).size())
+                                              : TextOf(value)});
+    }
+    table.Print(session.Out());
+    for (const auto& [id, value] : values.GetDatastore()) {
+        if (!IsLongVector(value)) {
+            continue;
+        }
+        const std::vector<double> numbers = NumbersOf(value);
+        fmt::print(session.Out(), "\n{}:\n", id);
+        if (vectors == Vectors::Numbers) {
+            PrintNumbers(session.Out(), numbers);
+        } else if (std::all_of(numbers.begin(), numbers.end(),
+                               [&numbers](double number) { return number == numbers.front(); })) {
+            fmt::print(session.Out(), "  all {} elements are {}\n", numbers.size(), numbers.front());
+        } else {
+            PlotStyle style = session.StyleOfPlots();
+            style.height = PlotHeight;
+            style.indent = "  ";
+            PrintPlot(session.Out(), numbers, style);
+        }
+    }
+}
+
+Json JsonOf(const Properties& values) {
+    Json object = Json::object();
+    for (const auto& [id, value] : values.GetDatastore()) {
+        object[std::to_string(id)] = JsonOf(value);
+    }
+    return object;
+}
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,442 @@
+#include "Memory/ImageEdit.h"
+#include "Memory/ImageModel.h"
+#include "Protocol/ByteOrder.h"
+#include "ToolFixture.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using Cli::EepromImage;
+using Cli::ExitCode;
+
+EepromImage Calibrated(const char* value) {
+    return Cli::WithCalibration(Cli::FreshImage(), {{1211, value}}).image;
+}
+
+class MemoryCommandsTest : public ToolTest {
+  protected:
+    MemoryCommandsTest() : instrument(host.Add("sim")) {
+        EepromImage image = Calibrated("77");
+        Cli::SetRawWord(image, 10203, 0xCAFE);
+        std::fill(image.begin() + 1064, image.begin() + 2048, std::uint8_t{0x5A});
+        instrument.SetEeprom(image);
+        before = instrument.Eeprom();
+    }
+
+    void ExpectUnchanged() { EXPECT_EQ(instrument.Eeprom(), before); }
+    std::vector<std::uint32_t> ChangedAddresses() {
+        const EepromImage now = instrument.Eeprom();
+        std::vector<std::uint32_t> addresses;
+        for (std::uint32_t at = 0; at < now.size(); ++at) {
+            if (now[at] != before[at]) {
+                addresses.push_back(at);
+            }
+        }
+        return addresses;
+    }
+
+    Simulator::SimulatedInstrument& instrument;
+    EepromImage before;
+    const std::string image = folder.Path("image");
+    const std::string backup = folder.Path("backup");
+};
+OSTRA_ON_BOTH_TRANSPORTS(MemoryCommandsTest);
+
+TEST_P(MemoryCommandsTest, ReadingChangesNothing) {
+    WriteFile(image, before);
+    for (const std::vector<std::string>& command : std::vector<std::vector<std::string>>{
+             {"eeprom", "backup", backup},
+             {"eeprom", "show"},
+             {"eeprom", "show", "--json"},
+             {"eeprom", "check"},
+             {"eeprom", "diff", image},
+             {"calibration", "show"},
+             {"log", "show"},
+             {"ram", "show"},
+             {"binary", "get", folder.Path("block")},
+             {"word", "get"},
+         }) {
+        // Not even the same bytes once more: the first write would stall.
+        host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-out 0+:stall"));
+        Succeed(command);
+        ExpectUnchanged();
+    }
+    EXPECT_EQ(ReadFile(backup), before);
+    EXPECT_EQ(ReadFile(folder.Path("block")), Cli::BinaryBlockOf(before));
+}
+
+/// The same command on an instrument and on an image of it says the same.
+TEST_P(MemoryCommandsTest, ImagesAreShownAsInstrumentsAre) {
+    WriteFile(image, before);
+    const auto withoutSource = [this] {
+        auto json = tool.Json();
+        json.erase("source");
+        return json;
+    };
+    for (const std::vector<std::string>& command :
+         std::vector<std::vector<std::string>>{{"eeprom", "show"},
+                                               {"eeprom", "check"},
+                                               {"calibration", "show"},
+                                               {"log", "show"},
+                                               {"word", "get"}}) {
+        std::vector<std::string> arguments = command;
+        arguments.push_back("--json");
+        Succeed(arguments);
+        const auto ofInstrument = withoutSource();
+        if (command[0] != "eeprom") {
+            arguments.push_back("--image");
+        }
+        arguments.push_back(image);
+        Succeed(arguments);
+        EXPECT_EQ(withoutSource(), ofInstrument) << testing::PrintToString(command);
+    }
+}
+
+TEST_P(MemoryCommandsTest, ShowTellsWhatIsInTheEeprom) {
+    Succeed({"eeprom", "show", "--json"});
+    const auto shown = tool.Json();
+    EXPECT_EQ(shown["source"], Identifier());
+    EXPECT_EQ(shown["table"]["length"], 334);
+    EXPECT_EQ(shown["table"]["entries"].size(), 55u);
+    EXPECT_EQ(shown["calibration"]["1211"], 77);
+    EXPECT_EQ(shown["calibration"]["1000"], (nlohmann::json{-1.0, -1.0}));
+    EXPECT_EQ(shown["log"]["used"], "main copy");
+    EXPECT_EQ(shown["log"]["values"]["10010"].size(), 128u);
+    EXPECT_EQ(shown["words"]["10203"], 0xCAFE);
+    EXPECT_EQ(shown["binary"].get<std::string>().substr(0, 4), "5a5a");
+    Succeed({"eeprom", "show"});
+    EXPECT_NE(tool.Out().find("0000CAFE"), std::string::npos) << tool.Out();
+}
+
+TEST_P(MemoryCommandsTest, VectorsAreDrawnOrPrinted) {
+    Cli::ImageModel model(before);
+    std::vector<std::int32_t> ramp(128);
+    for (std::size_t i = 0; i < ramp.size(); ++i) {
+        ramp[i] = static_cast<std::int32_t>(i) * 1000;
+    }
+    model.Get().SetProperty(10010, Cli::Property(ramp));
+    model.Get().DumpLog();
+    instrument.SetEeprom(model.Contents());
+    Succeed({"log", "show"});
+    EXPECT_NE(tool.Out().find('*'), std::string::npos) << tool.Out();
+    EXPECT_EQ(tool.Out().find("77000"), std::string::npos);
+    Succeed({"log", "show", "--numbers"});
+    EXPECT_NE(tool.Out().find(" 77000"), std::string::npos) << tool.Out();
+}
+
+TEST_P(MemoryCommandsTest, CheckAnswersWithItsExitCode) {
+    Succeed({"eeprom", "check"});
+    EepromImage damaged = before;
+    damaged[4096] = 7;
+    instrument.SetEeprom(damaged);
+    EXPECT_EQ(tool.Run({"eeprom", "check"}), ExitCode::BadData);
+    EXPECT_NE(tool.Out().find("error"), std::string::npos);
+    EXPECT_EQ(tool.Run({"eeprom", "check", "--json"}), ExitCode::BadData);
+    EXPECT_EQ(tool.Json()["sane"], false);
+    for (const char* command : {"calibration", "log"}) {
+        EXPECT_EQ(tool.Run({command, "show"}), ExitCode::BadData) << command;
+    }
+    EXPECT_EQ(tool.Run({"eeprom", "show"}), ExitCode::BadData);
+    EXPECT_NE(tool.Err().find("eeprom check"), std::string::npos) << tool.Err();
+    Succeed({"eeprom", "backup", backup});  // whatever it holds
+    EXPECT_EQ(ReadFile(backup), damaged);
+    Succeed({"binary", "get", folder.Path("block")});
+}
+
+TEST_P(MemoryCommandsTest, WriteMakesABackupThatRestores) {
+    WriteFile(image, Calibrated("5"));
+    Succeed({"eeprom", "write", image, "--backup", backup, "--json"});
+    EXPECT_EQ(instrument.Eeprom(), Calibrated("5"));
+    EXPECT_EQ(ReadFile(backup), before);
+    EXPECT_EQ(tool.Json()["backup"], backup);
+    EXPECT_GT(tool.Json()["pieces"], 0);
+    Succeed({"eeprom", "restore", backup});
+    ExpectUnchanged();
+    Succeed({"eeprom", "restore", backup});
+    EXPECT_NE(tool.Out().find("nothing to write"), std::string::npos);
+}
+
+TEST_P(MemoryCommandsTest, ABackupIsNeverWrittenOver) {
+    WriteFile(image, Calibrated("5"));
+    WriteFile(backup, {1, 2, 3});
+    EXPECT_EQ(tool.Run({"eeprom", "write", image, "--backup", backup}), ExitCode::File);
+    ExpectUnchanged();
+    EXPECT_EQ(ReadFile(backup), (std::vector<std::uint8_t>{1, 2, 3}));
+}
+
+TEST_P(MemoryCommandsTest, BackupsGetANameOfTheirOwn) {
+    WriteFile(image, Calibrated("5"));
+    const auto previous = std::filesystem::current_path();
+    std::filesystem::current_path(folder.Path(""));
+    Succeed({"eeprom", "write", image, "--json"});
+    const std::string first = tool.Json()["backup"];
+    Succeed({"calibration", "set", "1211=6", "--json"});
+    const std::string second = tool.Json()["backup"];
+    std::filesystem::current_path(previous);
+    EXPECT_TRUE(first.starts_with("ostra-sim-") && first.ends_with(".eeprom")) << first;
+    EXPECT_EQ(ReadFile(folder.Path(first)), before);
+    EXPECT_EQ(ReadFile(folder.Path(second)), Calibrated("5"));
+}
+
+TEST_P(MemoryCommandsTest, DryRunsChangeNothingAndLeaveNoFile) {
+    WriteFile(image, Calibrated("5"));
+    WriteFile(folder.Path("block"), std::vector<std::uint8_t>(1904, 1));
+    for (const std::vector<std::string>& command : std::vector<std::vector<std::string>>{
+             {"eeprom", "write", image},
+             {"eeprom", "restore", image},
+             {"calibration", "set", "1211=5"},
+             {"log", "reset"},
+             {"binary", "put", folder.Path("block")},
+             {"word", "put", "10200=1"},
+             {"ram", "set", "2010=5"},
+         }) {
+        const auto parameters =
+            instrument.WithCommands([](const auto& commands) { return commands.parameters; });
+        std::vector<std::string> arguments = command;
+        arguments.insert(arguments.end(), {"--dry-run", "--json"});
+        Succeed(arguments);
+        EXPECT_EQ(tool.Json()["dryRun"], true);
+        ExpectUnchanged();
+        EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.parameters; }),
+                  parameters);
+    }
+    EXPECT_EQ(folder.Files(), (std::vector<std::string>{"block", "image"}));
+}
+
+TEST_P(MemoryCommandsTest, OnlySaneImagesAreWritten) {
+    EepromImage erased(8192, 0xFF);
+    WriteFile(image, erased);
+    EXPECT_EQ(tool.Run({"eeprom", "write", image, "--no-backup"}), ExitCode::BadData);
+    EXPECT_EQ(tool.Run({"eeprom", "restore", image}), ExitCode::BadData);
+    ExpectUnchanged();
+    Succeed({"eeprom", "write", image, "--no-backup", "--force"});
+    EXPECT_EQ(instrument.Eeprom(), erased);
+    WriteFile(image, std::vector<std::uint8_t>(8191));
+    EXPECT_EQ(tool.Run({"eeprom", "write", image, "--force"}), ExitCode::BadData)
+        << "no force makes it an image";
+    EXPECT_EQ(tool.Run({"eeprom", "write", folder.Path("missing")}), ExitCode::File);
+}
+
+/// Wherever a write fails, the tool says how to undo it, and that works.
+TEST_P(MemoryCommandsTest, AFailedWriteTellsTheWayBack) {
+    EepromImage wanted = before;
+    std::fill(wanted.begin() + 1100, wanted.begin() + 4000, std::uint8_t{0x77});
+    WriteFile(image, Cli::WithCalibration(wanted, {{1211, "5"}}).image);
+    int failures = 0;
+    for (std::uint32_t piece = 0;; ++piece) {
+        instrument.SetEeprom(before);
+        std::filesystem::remove(backup);
+        host.Bus().SetFaults("sim",
+                             Simulator::FaultPlan::Parse("bulk-out " + std::to_string(piece) + ":stall"));
+        const ExitCode code = tool.Run({"eeprom", "write", image, "--backup", backup, "--force"});
+        host.Bus().SetFaults("sim", {});
+        if (code == ExitCode::Success) {
+            break;
+        }
+        ++failures;
+        ASSERT_EQ(code, ExitCode::InputOutput) << tool.Err();
+        ASSERT_NE(tool.Err().find("ostra eeprom restore " + backup + " --device sim"), std::string::npos)
+            << tool.Err();
+        Succeed({"eeprom", "restore", backup, "--device", "sim"});
+        ExpectUnchanged();
+    }
+    EXPECT_GT(failures, 20);
+}
+
+TEST_P(MemoryCommandsTest, WhatReadsBackDifferentlyIsAFailure) {
+    WriteFile(image, Calibrated("5"));
+    // Readings 0 to 3 are two of the whole EEPROM before the write, 4 and 5 the one after it.
+    host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-in 5:flip=100"));
+    EXPECT_EQ(tool.Run({"eeprom", "write", image, "--backup", backup}), ExitCode::InputOutput);
+    EXPECT_NE(tool.Err().find("reads back differently"), std::string::npos) << tool.Err();
+    EXPECT_NE(tool.Err().find("eeprom restore"), std::string::npos) << tool.Err();
+}
+
+TEST_P(MemoryCommandsTest, ABackupThatCannotBeTrustedIsNone) {
+    WriteFile(image, Calibrated("5"));
+    for (const int reading : {0, 1, 2, 3}) {
+        host.Bus().SetFaults("sim",
+                             Simulator::FaultPlan::Parse("bulk-in " + std::to_string(reading) + ":flip=9"));
+        EXPECT_EQ(tool.Run({"eeprom", "write", image, "--backup", backup}), ExitCode::InputOutput);
+        EXPECT_NE(tool.Err().find("two readings of the EEPROM differ"), std::string::npos) << tool.Err();
+        EXPECT_EQ(tool.Run({"eeprom", "backup", backup}), ExitCode::InputOutput);
+        ExpectUnchanged();
+        EXPECT_EQ(folder.Files(), std::vector<std::string>{"image"});
+    }
+}
+
+TEST_P(MemoryCommandsTest, CtrlCEndsAWriteBetweenTwoPieces) {
+    EepromImage wanted = before;
+    std::fill(wanted.begin() + 5000, wanted.end(), std::uint8_t{0x77});
+    WriteFile(image, wanted);
+    Cli::Interruption interruption;
+    tool.interruption = &interruption;
+    // In the middle of the fifth piece.
+    host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-out 12:late=400"));
+    auto& scheduler = Platform::ClockScheduler();
+    scheduler.CallAt(scheduler.Now() + 300'000, [&] { interruption.Request(); });
+    EXPECT_EQ(tool.Run({"eeprom", "write", image, "--backup", backup}), ExitCode::Interrupted) << tool.Err();
+    EXPECT_NE(tool.Err().find("interrupted; 5 of 13 pieces"), std::string::npos) << tool.Err();
+    EXPECT_NE(tool.Err().find("eeprom restore"), std::string::npos) << tool.Err();
+    // 5000 lies in the piece from 4864 on.
+    EepromImage expected = before;
+    std::fill(expected.begin() + 5000, expected.begin() + 4864 + 5 * 256, std::uint8_t{0x77});
+    EXPECT_EQ(instrument.Eeprom(), expected);
+}
+
+TEST_P(MemoryCommandsTest, CalibrationSetWritesItsValuesOnly) {
+    Succeed({"calibration", "set", "1211=0x01020304", "1000=0.5,-2", "--backup", backup});
+    EXPECT_EQ(ReadFile(backup), before);
+    const auto changed = ChangedAddresses();
+    // 1000 at 4608 was -1.0 twice: 0.5 and -2.0 differ from it in two bytes and one; 1211 at 4708.
+    EXPECT_EQ(changed, (std::vector<std::uint32_t>{4608, 4609, 4612, 4613, 4708, 4709, 4710, 4711}));
+    Succeed({"calibration", "show", "--json"});
+    EXPECT_EQ(tool.Json()["calibration"]["1211"], 0x01020304);
+    EXPECT_EQ(tool.Json()["calibration"]["1000"], (nlohmann::json{0.5, -2.0}));
+    Succeed({"calibration", "set", "1211=77", "1000=-1,-1", "--no-backup"});
+    ExpectUnchanged();
+    EXPECT_EQ(tool.Run({"calibration", "set", "1211=1,2"}), ExitCode::Usage);
+    EXPECT_EQ(tool.Run({"calibration", "set", "10002=1"}), ExitCode::Usage);
+    EXPECT_EQ(tool.Run({"calibration", "set", "1211"}), ExitCode::Usage);
+    ExpectUnchanged();
+}
+
+TEST_P(MemoryCommandsTest, ChangesOfAnImageFileNeedNoInstrument) {
+    host.Bus().Unplug("sim");
+    WriteFile(image, before);
+    WriteFile(folder.Path("block"), std::vector<std::uint8_t>(1904, 9));
+    Succeed({"calibration", "set", "1211=5", "--image", image});
+    Succeed({"word", "put", "10200=7", "10201=0xFFFF0000", "--image", image});
+    Succeed({"binary", "put", folder.Path("block"), "--image", image});
+    Succeed({"log", "reset", "--image", image});
+    EepromImage expected = Calibrated("5");
+    Cli::SetRawWord(expected, 10200, 7);
+    Cli::SetRawWord(expected, 10201, 0xFFFF0000);
+    Cli::SetRawWord(expected, 10203, 0xCAFE);
+    expected = Cli::WithBinaryBlock(expected, std::vector<std::uint8_t>(1904, 9));
+    EXPECT_EQ(ReadFile(image), expected);
+    EXPECT_EQ(folder.Files(), (std::vector<std::string>{"block", "image"})) << "no backups of files";
+    EXPECT_EQ(tool.Run({"word", "get", "--image", image, "--device", "sim"}), ExitCode::Usage);
+}
+
+TEST_P(MemoryCommandsTest, LogResetEmptiesBothCopies) {
+    Cli::ImageModel model(before);
+    model.Get().SetProperty(10002, Cli::Property(std::int32_t{5}));
+    model.Get().DumpLog();
+    EepromImage used = model.Contents();
+    used[2048] ^= 1;  // the second copy is damaged
+    instrument.SetEeprom(used);
+    Succeed({"log", "show", "--json"});
+    EXPECT_EQ(tool.Json()["values"]["10002"], 5);
+    EXPECT_EQ(tool.Json()["secondValid"], false);
+    Succeed({"log", "reset", "--no-backup"});
+    EXPECT_EQ(instrument.Eeprom(), before);
+}
+
+TEST_P(MemoryCommandsTest, WordsAndBlockOnAnInstrument) {
+    Succeed({"word", "put", "10200=1", "10215=0xFFFFFFFE", "--no-backup"});
+    EXPECT_EQ(ChangedAddresses(), (std::vector<std::uint32_t>{4032, 4033, 4034, 4035, 4095}));
+    Succeed({"word", "get", "10215", "10216", "--json"});
+    EXPECT_EQ(tool.Json()["words"], (nlohmann::json{{"10215", 0xFFFFFFFE}, {"10216", 0x0001014E}}));
+    EXPECT_EQ(tool.Run({"word", "put", "10216=1", "--no-backup"}), ExitCode::Usage);
+    EXPECT_EQ(tool.Run({"word", "put", "10200=0x100000000", "--no-backup"}), ExitCode::Usage);
+    WriteFile(folder.Path("block"), std::vector<std::uint8_t>(1903));
+    EXPECT_EQ(tool.Run({"binary", "put", folder.Path("block")}), ExitCode::BadData);
+    WriteFile(folder.Path("block"), std::vector<std::uint8_t>(1904, 4));
+    Succeed({"binary", "put", folder.Path("block"), "--no-backup"});
+    Succeed({"binary", "get", folder.Path("again")});
+    EXPECT_EQ(ReadFile(folder.Path("again")), ReadFile(folder.Path("block")));
+}
+
+TEST_P(MemoryCommandsTest, DiffNamesValuesAndAreas) {
+    WriteFile(image, before);
+    Succeed({"eeprom", "diff", image});
+    WriteFile(backup, Cli::WithCalibration(before, {{1211, "78"}}).image);
+    EXPECT_EQ(tool.Run({"eeprom", "diff", image, backup}), ExitCode::Different);
+    EXPECT_NE(tool.Out().find("calibration  1211  77 -> 78"), std::string::npos) << tool.Out();
+    EXPECT_EQ(tool.Run({"eeprom", "diff", backup, "--json"}), ExitCode::Different);
+    EXPECT_EQ(tool.Json()["b"], Identifier());
+    EXPECT_EQ(tool.Json()["values"],
+              nlohmann::json::parse(R"([{"kind":"calibration","id":1211,"a":78,"b":77}])"));
+    EXPECT_EQ(tool.Json()["areas"][0]["firstDifference"], 4711);
+}
+
+TEST_P(MemoryCommandsTest, NewMakesTheImageOfAFreshInstrument) {
+    Succeed({"eeprom", "new", image});
+    host.Add("fresh");
+    Succeed({"eeprom", "diff", image, "--device", "fresh"});
+}
+
+TEST_P(MemoryCommandsTest, SeveralInstrumentsMustBeToldApartBeforeOneIsChanged) {
+    host.Add("other");
+    WriteFile(image, Calibrated("5"));
+    for (const std::vector<std::string>& command : std::vector<std::vector<std::string>>{
+             {"eeprom", "write", image}, {"calibration", "set", "1211=5"}, {"log", "reset"}}) {
+        EXPECT_EQ(tool.Run(command), ExitCode::Usage);
+        EXPECT_NE(tool.Err().find("--device"), std::string::npos);
+    }
+    ExpectUnchanged();
+}
+
+class RamTest : public ToolTest {};
+OSTRA_ON_BOTH_TRANSPORTS(RamTest);
+
+TEST_P(RamTest, TimesFollowTheModeThatTheInstrumentIsIn) {
+    auto& instrument = host.Add("sim");
+    Succeed({"ram", "set", "2009=0.005", "2008=1", "--json"});
+    EXPECT_NEAR(tool.Json()["changes"][0]["after"], 0.004998, 1e-7) << "147 units of 34 us";
+    instrument.WithCommands([](const auto& commands) {
+        EXPECT_EQ(commands.mode, 2);
+        EXPECT_EQ(commands.parameters.p1, 147);
+        EXPECT_EQ(commands.parameters.p4 & 1, 1);
+    });
+    // A new run of the tool knows the mode's time unit, and leaves what it was not asked to change.
+    Succeed({"ram", "set", "2010=200"});
+    instrument.WithCommands([](const auto& commands) {
+        EXPECT_EQ(commands.mode, 2);
+        EXPECT_EQ(commands.parameters.p1, 147);
+        EXPECT_EQ(commands.parameters.p3, 200);
+    });
+    Succeed({"ram", "show", "--json"});
+    EXPECT_NEAR(tool.Json()["ram"]["2009"], 0.004998, 1e-7);
+}
+
+TEST_P(RamTest, OldFirmwareHasOneMode) {
+    Simulator::InstrumentSettings settings;
+    settings.firmware = Simulator::OldFirmware;
+    auto& instrument = host.Add("sim", settings);
+    Succeed({"ram", "set", "2009=0.068", "2001=0.0884"});
+    instrument.WithCommands([](const auto& commands) {
+        EXPECT_EQ(commands.parameters.p1, 1000);
+        EXPECT_EQ(commands.parameters.p2, 10);
+    });
+}
+
+TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
+    auto& instrument = host.Add("sim");
+    const auto modeOf = [&] {
+        return instrument.WithCommands([](const auto& commands) { return commands.mode; });
+    };
+    Succeed({"ram", "set", "2009=0.005"});
+    struct Case {
+        const char* seconds;
+        const char* text;
+    };
+    for (const Case& row :
+         {Case{"10", "Integration time too high"}, Case{"0.0009", "Integration time too low"}}) {
+        EXPECT_EQ(tool.Run({"ram", "set", std::string("2009=") + row.seconds}), ExitCode::BadData);
+        EXPECT_NE(tool.Err().find(row.text), std::string::npos) << tool.Err();
+        EXPECT_NE(tool.Err().find("mode 3: 0.001 s to 0.65535 s"), std::string::npos) << tool.Err();
+        EXPECT_EQ(modeOf(), 2) << "back in its mode";
+    }
+}
+
+TEST_P(RamTest, RefusesWhatCannotBeSet) {
+    host.Add("sim");
+    for (const char* assignment : {"2012=1", "2021=1", "2005=1", "1211=1", "2009=x", "2010=1,2", "2009"}) {
+        EXPECT_EQ(tool.Run({"ram", "set", assignment}), ExitCode::Usage) << assignment;
+    }
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests

@@ -1,0 +1,404 @@
+#include <gtest/gtest.h>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "Failure.h"
+#include "FreshEeprom.h"
+#include "Memory/EepromWrite.h"
+#include "Memory/ImageCheck.h"
+#include "Memory/ImageDiff.h"
+#include "Memory/ImageEdit.h"
+#include "Memory/ImageModel.h"
+#include "Memory/ImageTransport.h"
+#include "Memory/PropertyText.h"
+#include "Protocol/ByteOrder.h"
+#include "Protocol/EepromMap.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using namespace Cli;
+namespace Map = Protocol::EepromMap;
+using Severity = ImageFinding::Severity;
+
+/// A fresh image with something in every area.
+EepromImage UsedImage() {
+    EepromImage image = FreshImage();
+    image = WithCalibration(image, {{1211, "77"}, {1000, "0.5,-2"}}).image;
+    for (std::uint32_t i = 0; i < Map::BinaryFirstSize; ++i) {
+        image[Map::BinaryFirst + i] = static_cast<std::uint8_t>(i * 3);
+    }
+    for (std::uint32_t i = 0; i < Map::BinarySecondSize; ++i) {
+        image[Map::BinarySecond + i] = static_cast<std::uint8_t>(i * 5 + 1);
+    }
+    SetRawWord(image, 10203, 0x01020304);
+    image[8000] = 0x42;
+    return image;
+}
+
+/// Addresses at which two images differ.
+std::vector<std::uint32_t> Differences(const EepromImage& a, const EepromImage& b) {
+    std::vector<std::uint32_t> addresses;
+    for (std::uint32_t at = 0; at < a.size(); ++at) {
+        if (a[at] != b[at]) {
+            addresses.push_back(at);
+        }
+    }
+    return addresses;
+}
+
+template <class Function>
+std::string FailureOf(Function function, ExitCode code = ExitCode::Usage) {
+    try {
+        function();
+    } catch (const ToolFailure& failure) {
+        EXPECT_EQ(failure.Code(), code) << failure.what();
+        return failure.what();
+    }
+    ADD_FAILURE() << "no failure";
+    return {};
+}
+
+TEST(FreshImageTest, IsWhatAFreshInstrumentHolds) {
+    EXPECT_EQ(FreshImage(), Simulator::FreshEeprom());
+}
+
+TEST(ImageTransportTest, ReachesNothingOutsideTheImage) {
+    EepromImage image(8192, 7);
+    ImageTransport transport(image);
+    struct Access {
+        std::uint32_t address, count;
+        bool isInside;
+    };
+    for (const Access& access :
+         {Access{0, 8192, true}, Access{8191, 1, true}, Access{8192, 0, true}, Access{8191, 2, false},
+          Access{8193, 0, false}, Access{0xFFFFFFFF, 2, false}, Access{0, 8193, false}}) {
+        std::vector<std::uint8_t> buffer(9000);
+        DeviceDriver::Ostra::LowLevel::Bytes4 address;
+        Protocol::StoreBig32(address.data(), access.address);
+        const auto outcome = [&](auto operation) {
+            try {
+                operation();
+                return true;
+            } catch (const DeviceDriver::Generic::Utilities::IOException&) {
+                return false;
+            }
+        };
+        EXPECT_EQ(outcome([&] { transport.ReadEEPROM(address, {}, buffer.data(), access.count); }),
+                  access.isInside);
+        EXPECT_EQ(outcome([&] { transport.WriteEEPROM(address, {}, buffer.data(), access.count); }),
+                  access.isInside);
+    }
+    std::uint8_t id[8];
+    EXPECT_THROW(transport.GetChipID(id), DeviceDriver::Generic::Utilities::IOException);
+}
+
+TEST(PropertyTextTest, AssignmentsKeepTypeAndNumberOfElements) {
+    const Property oneLong(std::int32_t{0});
+    const Property twoFloats(std::vector<float>{0, 0});
+    struct Case {
+        const char* text;
+        const Property& pattern;
+        const char* result;
+    };
+    for (const Case& row : {
+             Case{"1=5", oneLong, "5"},
+             Case{"1=-2147483648", oneLong, "-2147483648"},
+             Case{"1=2147483647", oneLong, "2147483647"},
+             Case{"1=0xFFFFFFFF", oneLong, "-1"},
+             Case{"0x3E8=0x10", oneLong, "16"},
+             Case{"65535=0.1, -1e-3", twoFloats, "0.1, -0.001"},
+             Case{"1=3,4", twoFloats, "3, 4"},
+         }) {
+        EXPECT_EQ(TextOf(ParseValue(ParseAssignment(row.text), row.pattern)), row.result) << row.text;
+    }
+    for (const char* text : {"", "1", "=5", "1=", "x=5", "65536=5", "-1=5", "1 =5"}) {
+        FailureOf([text] { ParseAssignment(text); });
+    }
+    for (const char* text : {"1=5,6", "1=2147483648", "1=-2147483649", "1=5x", "1=1.5", "1=0x", "1=--5",
+                             "1=0x100000000", "1= "}) {
+        FailureOf([&] { ParseValue(ParseAssignment(text), oneLong); });
+    }
+    for (const char* text : {"1=5", "1=1,2,3", "1=nan,1", "1=1,inf", "1=1e39,0", "1=1;2", "1=,"}) {
+        FailureOf([&] { ParseValue(ParseAssignment(text), twoFloats); });
+    }
+}
+
+TEST(ImageEditTest, CalibrationChangesTheBytesOfItsValuesOnly) {
+    const EepromImage before = UsedImage();
+    const EditedImage edited = WithCalibration(before, {{1211, "0x01020304"}, {3013, "9"}});
+    // 1211 lies at 4708, 3013 at 4752.
+    EXPECT_EQ(Differences(before, edited.image),
+              (std::vector<std::uint32_t>{4708, 4709, 4710, 4711, 4752, 4753, 4754, 4755}));
+    ASSERT_EQ(edited.changes.size(), 2u);
+    EXPECT_EQ(TextOf(edited.changes[0].before), "77");
+    EXPECT_EQ(TextOf(edited.changes[0].after), "16909060");
+    EXPECT_EQ(ImageModel(edited.image).Get().GetProperty(1211).AsLong(), 0x01020304);
+}
+
+TEST(ImageEditTest, CalibrationLeavesADamagedLogAlone) {
+    EepromImage before = UsedImage();
+    before[9] ^= 1;  // main copy
+    EXPECT_EQ(Differences(before, WithCalibration(before, {{1211, "78"}}).image),
+              std::vector<std::uint32_t>{4711});
+    before[2048 + 9] ^= 2;  // and the other
+    EXPECT_EQ(Differences(before, WithCalibration(before, {{1211, "78"}}).image),
+              std::vector<std::uint32_t>{4711});
+}
+
+TEST(ImageEditTest, RefusesWhatItCannotProve) {
+    const EepromImage image = UsedImage();
+    FailureOf([&] { WithCalibration(image, {{10002, "5"}}); });
+    FailureOf([&] { WithCalibration(image, {{1206, "5"}}); });
+    FailureOf([&] { WithCalibration(image, {{1000, "5"}}); });
+    // The table says that the calibration lies elsewhere than the driver writes it.
+    EepromImage moved = image;
+    for (std::uint32_t at = Map::Table + 4; at + 6 <= Map::Table + 334; at += 6) {
+        const std::uint32_t address = Protocol::LoadBig32(&moved[at + 2]);
+        if (address >= Map::Calibration) {
+            Protocol::StoreBig32(&moved[at + 2], address + 1000);
+        }
+    }
+    std::copy_n(image.begin() + Map::Calibration, Map::CalibrationSize,
+                moved.begin() + Map::Calibration + 1000);
+    ASSERT_EQ(ImageModel(moved).Get().GetProperty(1211).AsLong(), 77);
+    EXPECT_THROW(WithCalibration(moved, {{1211, "5"}}), DeviceDriver::Generic::Utilities::DataException);
+    EepromImage corrupt = image;
+    corrupt[Map::Table + 1] = 2;
+    EXPECT_THROW(WithCalibration(corrupt, {{1211, "5"}}), DeviceDriver::Generic::Utilities::DataException);
+    EXPECT_THROW(WithEmptyLog(corrupt), DeviceDriver::Generic::Utilities::DataException);
+}
+
+TEST(ImageEditTest, AnEmptyLogIsEmptyTwiceAndTouchesNothingElse) {
+    EepromImage before = UsedImage();
+    ImageModel model(before);
+    model.Get().SetProperty(10002, Property(std::int32_t{5}));
+    model.Get().SetProperty(10010, Property(std::vector<std::int32_t>(128, 3)));
+    model.Get().DumpLog();
+    before = model.Contents();
+    const EepromImage after = WithEmptyLog(before);
+    EXPECT_EQ(std::count(after.begin(), after.begin() + 1064, 0), 1064);
+    EXPECT_EQ(std::count(after.begin() + 2048, after.begin() + 3112, 0), 1064);
+    for (const std::uint32_t at : Differences(before, after)) {
+        EXPECT_TRUE(at < 1064 || (at >= 2048 && at < 3112)) << at;
+    }
+    EXPECT_EQ(WithEmptyLog(after), after);
+}
+
+TEST(ImageEditTest, BinaryBlockLiesInTwoPlaces) {
+    const EepromImage before = UsedImage();
+    std::vector<std::uint8_t> block(Map::BinarySize);
+    for (std::size_t i = 0; i < block.size(); ++i) {
+        block[i] = static_cast<std::uint8_t>(i % 251);
+    }
+    const EepromImage after = WithBinaryBlock(before, block);
+    EXPECT_EQ(BinaryBlockOf(after), block);
+    EXPECT_EQ(ImageModel(after).Get().LoadBinary(10100), block) << "as the driver sees it";
+    for (const std::uint32_t at : Differences(before, after)) {
+        EXPECT_TRUE((at >= 1064 && at < 2048) || (at >= 3112 && at < 4032)) << at;
+    }
+    for (const std::size_t size : {0u, 1903u, 1905u}) {
+        FailureOf([&] { WithBinaryBlock(before, std::vector<std::uint8_t>(size)); }, ExitCode::BadData);
+    }
+}
+
+TEST(ImageEditTest, RawWordsAsTheDriverSeesThem) {
+    EepromImage image = UsedImage();
+    for (const std::uint16_t id : {std::uint16_t{10200}, std::uint16_t{10215}}) {
+        SetRawWord(image, id, 0xA1B2C3D4);
+        EXPECT_EQ(ImageModel(image).Get().LoadBinary(id),
+                  (std::vector<std::uint8_t>{0xA1, 0xB2, 0xC3, 0xD4}));
+        EXPECT_EQ(RawWordOf(image, id), 0xA1B2C3D4);
+    }
+    EXPECT_EQ(RawWordOf(image, 10216), 0x0001014Eu) << "the table's header";
+    for (const std::uint16_t id : {std::uint16_t{10199}, std::uint16_t{10216}, std::uint16_t{10240}}) {
+        FailureOf([&] { SetRawWord(image, id, 0); });
+    }
+}
+
+std::string ErrorsOf(const EepromImage& image) {
+    std::string errors;
+    for (const ImageFinding& finding : CheckImage(image)) {
+        if (finding.severity == Severity::Error) {
+            errors += finding.area + ": " + finding.text + "\n";
+        }
+    }
+    return errors;
+}
+
+std::string TextOf(const std::vector<ImageFinding>& findings) {
+    std::string text;
+    for (const ImageFinding& finding : findings) {
+        text += std::string(NameOf(finding.severity)) + " " + finding.area + ": " + finding.text + "\n";
+    }
+    return text;
+}
+
+TEST(ImageCheckTest, AFreshImage) {
+    EXPECT_EQ(TextOf(CheckImage(FreshImage())),
+              "ok table: version 1, 334 bytes\n"
+              "ok table: 55 entries\n"
+              "ok log: main copy: checksum 0x00000000\n"
+              "ok log: second copy: checksum 0x00000000\n"
+              "ok log: the driver uses the main copy\n"
+              "ok calibration: 28 values\n"
+              "note calibration: 28 values are -1, as in a fresh instrument\n"
+              "ok binary block: empty\n"
+              "ok raw words: empty\n");
+    EXPECT_EQ(ErrorsOf(UsedImage()), "");
+}
+
+void SetEntry(EepromImage& image, std::uint32_t index, std::uint16_t id, std::uint32_t address) {
+    Protocol::StoreBig16(&image[Map::Table + 4 + 6 * index], id);
+    Protocol::StoreBig32(&image[Map::Table + 6 + 6 * index], address);
+}
+
+TEST(ImageCheckTest, FindsWhatIsWrong) {
+    struct Case {
+        const char* name;
+        void (*damage)(EepromImage& image);
+        const char* finding;
+        bool isSane;
+    };
+    for (const Case& row : {
+             Case{"erased", [](EepromImage& image) { image.assign(8192, 0xFF); },
+                  "error table: version 65535 instead of 1", false},
+             Case{"length", [](EepromImage& image) { Protocol::StoreBig16(&image[4098], 299); },
+                  "error table: length 299 instead of 300 to 512", false},
+             Case{"length between entries",
+                  [](EepromImage& image) { Protocol::StoreBig16(&image[4098], 333); },
+                  "warning table: the length does not end with an entry", true},
+             Case{"main log", [](EepromImage& image) { image[11] ^= 1; },
+                  "warning log: main copy: checksum 0x00000000 instead of 0x00000001", true},
+             Case{"used log", [](EepromImage& image) { image[11] ^= 1; },
+                  "ok log: the driver uses the second copy", true},
+             Case{"both logs",
+                  [](EepromImage& image) {
+                      image[11] ^= 1;
+                      image[2048 + 11] ^= 1;
+                  },
+                  "error log: the driver uses an empty log", false},
+             Case{"other log",
+                  [](EepromImage& image) {
+                      image[2048 + 3] = 1;
+                      image[2048 + 11] = 1;
+                  },
+                  "note log: the two copies hold different values", true},
+             Case{"address beyond the end", [](EepromImage& image) { SetEntry(image, 26, 1000, 9000); },
+                  "error table: values that end outside the image: 1000", false},
+             Case{"negative address", [](EepromImage& image) { SetEntry(image, 0, 10000, 0x80000000); },
+                  "error table: values that end outside the image: 10000", false},
+             Case{"overlap", [](EepromImage& image) { SetEntry(image, 27, 1001, 4612); },
+                  "error table: 1000 and 1001 overlap", true},
+             Case{"over the table", [](EepromImage& image) { SetEntry(image, 54, 2, 4608); }, "error table",
+                  false},
+             Case{"unknown entry", [](EepromImage& image) { SetEntry(image, 27, 1999, 4616); },
+                  "warning table: unknown identifiers: 1999", true},
+             Case{"missing value", [](EepromImage& image) { SetEntry(image, 27, 1999, 4616); },
+                  "warning table: the calibration lacks 1001", true},
+             Case{"no checksum", [](EepromImage& image) { SetEntry(image, 0, 1999, 0); },
+                  "error table: the driver refuses the image: id 10000 doesn't exist", false},
+             Case{"repeated", [](EepromImage& image) { SetEntry(image, 28, 1001, 4616); },
+                  "warning table: 1 entries repeat an identifier", true},
+             Case{"no number", [](EepromImage& image) { std::fill_n(image.begin() + 4608, 4, 0xFF); },
+                  "warning calibration: values that are no numbers: 1000", true},
+             Case{"binary block", [](EepromImage& image) { image[1064] = image[4031] = 0; },
+                  "ok binary block: 2 of 1904 bytes used", true},
+             Case{"words", [](EepromImage& image) { image[4032] = image[4035] = image[4095] = 0; },
+                  "ok raw words: 2 of 16 used", true},
+             Case{"rest", [](EepromImage& image) { image[4756] = image[8191] = 0; },
+                  "note rest: 2 bytes behind the calibration data are used", true},
+         }) {
+        EepromImage image = FreshImage();
+        row.damage(image);
+        const std::vector<ImageFinding> findings = CheckImage(image);
+        const std::string text = TextOf(findings);
+        EXPECT_NE(text.find(row.finding), std::string::npos) << row.name << ":\n" << text;
+        if (std::string_view(row.name) != "overlap") {
+            EXPECT_EQ(IsSane(findings), row.isSane) << row.name << ":\n" << text;
+        }
+    }
+}
+
+/// Whatever the bytes: an answer, no exception, and sane images are those that the driver takes.
+TEST(ImageCheckTest, AnyBytes) {
+    std::uint32_t state = 1;
+    const auto random = [&state] { return state = state * 1664525 + 1013904223; };
+    int sane = 0;
+    for (int round = 0; round < 3000; ++round) {
+        EepromImage image = UsedImage();
+        for (std::uint32_t changes = random() % 4 + 1; changes > 0; --changes) {
+            const std::uint32_t at = random() >> 8;
+            image[(random() >> 28) < 12 ? Map::Table + at % 340 : at % 8192] =
+                static_cast<std::uint8_t>(random() >> 24);
+        }
+        if (IsSane(CheckImage(image))) {
+            ++sane;
+            EXPECT_NO_THROW(ImageModel{image}) << round;
+        }
+        Compare(image, UsedImage());
+    }
+    EXPECT_GT(sane, 100);
+}
+
+TEST(ImageDiffTest, ByValueThenByArea) {
+    const EepromImage a = UsedImage();
+    EXPECT_TRUE(Compare(a, a).IsEmpty());
+    EXPECT_TRUE(Compare(a, a).values.empty());
+    EepromImage b = WithCalibration(a, {{1211, "78"}}).image;
+    SetRawWord(b, 10215, 1);
+    b[1064] ^= 0xFF;
+    b[3200] ^= 0xFF;
+    b[3201] ^= 0xFF;
+    b[8191] = 0;
+    const ImageDiff diff = Compare(a, b);
+    ASSERT_EQ(diff.values.size(), 2u);
+    EXPECT_EQ(diff.values[0].kind, "calibration");
+    EXPECT_EQ(diff.values[0].id, 1211);
+    EXPECT_EQ(TextOf(*diff.values[0].a), "77");
+    EXPECT_EQ(TextOf(*diff.values[0].b), "78");
+    EXPECT_EQ(diff.values[1].kind, "word");
+    EXPECT_EQ(diff.values[1].id, 10215);
+    std::string areas;
+    for (const ImageDiff::Area& area : diff.areas) {
+        areas += area.name + " " + std::to_string(area.first) + "-" + std::to_string(area.last) + ": " +
+                 std::to_string(area.different) + " from " + std::to_string(area.firstDifference) + "\n";
+    }
+    EXPECT_EQ(areas,
+              "binary block, first part 1064-2047: 1 from 1064\n"
+              "binary block, second part 3112-4031: 2 from 3200\n"
+              "raw words 4032-4095: 4 from 4092\n"
+              "calibration 4608-4755: 1 from 4711\n"
+              "rest 4756-8191: 1 from 8191\n");
+}
+
+TEST(ImageDiffTest, AnImageThatCannotBeReadIsComparedByArea) {
+    const EepromImage a = UsedImage();
+    EepromImage b = a;
+    b[Map::Table] = 9;
+    const ImageDiff diff = Compare(a, b);
+    EXPECT_EQ(diff.unreadable, "corrupt EAT detected!!");
+    ASSERT_EQ(diff.areas.size(), 1u);
+    EXPECT_EQ(diff.areas[0].name, "allocation table");
+}
+
+TEST(WritePiecesTest, OnlyWhatDiffersInPiecesOfAtMost256Bytes) {
+    const EepromImage a(8192, 1);
+    EepromImage b = a;
+    const auto text = [&](Granularity granularity) {
+        std::string pieces;
+        for (const WritePiece& piece : PiecesToWrite(a, b, granularity)) {
+            pieces += std::to_string(piece.address) + "+" + std::to_string(piece.length) + " ";
+        }
+        return pieces;
+    };
+    EXPECT_EQ(text(Granularity::Pieces), "");
+    EXPECT_EQ(text(Granularity::Elements), "");
+    b[5] = b[11] = b[8191] = 0;
+    EXPECT_EQ(text(Granularity::Pieces), "0+256 7936+256 ");
+    EXPECT_EQ(text(Granularity::Elements), "4+8 8188+4 ");
+    std::fill(b.begin() + 1000, b.begin() + 1600, std::uint8_t{0});
+    EXPECT_EQ(text(Granularity::Elements), "4+8 1000+256 1256+256 1512+88 8188+4 ");
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests
