@@ -30,6 +30,7 @@ target_compile_options(ostra_options INTERFACE
   $<$<AND:$<CXX_COMPILER_ID:GNU>,$<NOT:$<CONFIG:Debug>>>:-Wno-restrict>
   $<$<AND:$<CXX_COMPILER_ID:GNU>,$<NOT:$<CONFIG:Debug>>>:-Wno-array-bounds>
   $<$<AND:$<CXX_COMPILER_ID:GNU>,$<NOT:$<CONFIG:Debug>>>:-Wno-stringop-overflow>
+  $<$<AND:$<CXX_COMPILER_ID:GNU>,$<NOT:$<CONFIG:Debug>>>:-Wno-maybe-uninitialized>
   -ffunction-sections -fdata-sections
   "-fdebug-prefix-map=${PROJECT_SOURCE_DIR}/=")
 target_link_libraries(ostra_options INTERFACE Threads::Threads)
