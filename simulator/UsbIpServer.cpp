@@ -13,6 +13,7 @@
 #include <cerrno>
 #include <cstring>
 #include <fstream>
+#include <optional>
 #include <stdexcept>
 #include <utility>
 
@@ -148,10 +149,12 @@ class UsbIpServer::Connection final {
         : server(ownServer),
           file(connectedSocket),
           peerText(peer),
-          exports(ownServer, std::move(offered), peer, tcp) {}
+          exports(std::in_place, ownServer, std::move(offered), peer, tcp) {}
     ~Connection() {
         Abandon();
-        session.reset();  // before the instrument counts as free again
+        session.reset();
+        exports.reset();
+        // The peer takes this for the sign that the instrument is free again.
         close(file);
     }
     Connection(const Connection&) = delete;
@@ -159,12 +162,12 @@ class UsbIpServer::Connection final {
 
     /// Waits for what the peer wants.
     void Begin() {
-        session = std::make_unique<UsbIpSession>(exports, [this] { FlushSoon(); });
+        session = std::make_unique<UsbIpSession>(*exports, [this] { FlushSoon(); });
         Watch();
     }
     /// Begins with an instrument that the peer need not ask for; false when somebody else has it.
     bool BeginWith(Exported& wanted) {
-        UsbIpExports::Import import = exports.Take(wanted);
+        UsbIpExports::Import import = exports->Take(wanted);
         if (!import.device) {
             return false;
         }
@@ -252,7 +255,7 @@ class UsbIpServer::Connection final {
     UsbIpServer& server;
     const int file;
     const std::string peerText;
-    Exports exports;
+    std::optional<Exports> exports;
     std::unique_ptr<UsbIpSession> session;
     // Received and not taken yet. Its size bounds how long one peer keeps the others waiting.
     std::array<std::uint8_t, 65536> input{};

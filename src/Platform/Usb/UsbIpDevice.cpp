@@ -23,6 +23,8 @@ using Clock = UsbIpSocket::Clock;
 
 /// A peer that does not answer a cancellation by then is given up.
 constexpr auto UnlinkPatience = std::chrono::milliseconds(1000);
+/// A peer that does not close its end by then, after this one was closed, is left to itself.
+constexpr auto ClosePatience = std::chrono::milliseconds(500);
 /// For what the device itself is asked on behalf of the layers above.
 constexpr auto RequestPatience = std::chrono::milliseconds(2000);
 
@@ -150,7 +152,7 @@ class UsbIpDevice final : public UsbDevice {
     std::vector<Running> running;
     std::uint32_t lastSequence = 0;
     bool connected = false;
-    bool releasing = false;
+    std::optional<Clock::time_point> releaseLimit;  // set while the claim is being given back
 };
 
 ErrorCode UsbIpDevice::Claim() {
@@ -171,7 +173,7 @@ ErrorCode UsbIpDevice::Claim() {
     {
         const std::lock_guard lock(mutex);
         connected = true;
-        releasing = false;
+        releaseLimit.reset();
     }
     // Signals are the host program's business: its own threads take them.
     sigset_t all;
@@ -214,9 +216,11 @@ void UsbIpDevice::Release() {
     }
     {
         const std::lock_guard lock(mutex);
-        releasing = true;
+        releaseLimit = Clock::now() + ClosePatience;
+        LimitReceiving();
     }
-    socket->Shutdown();
+    // Once the peer has closed its end, too, the device is free for the next who wants it.
+    socket->ShutdownSending();
     reader.join();
     const std::lock_guard sendLock(sendMutex);  // nobody is sending any more
     socket.reset();
@@ -235,7 +239,7 @@ ErrorCode UsbIpDevice::Submit(Transfer& transfer) try {
     const std::lock_guard sendLock(sendMutex);
     {
         const std::lock_guard lock(mutex);
-        if (!connected) {
+        if (!connected || releaseLimit) {
             return Errors::DeviceNotConnected;
         }
         packet.sequence = NextSequence();
@@ -273,7 +277,7 @@ void UsbIpDevice::Cancel(Transfer& transfer) {
 }
 
 void UsbIpDevice::LimitReceiving() {
-    std::optional<Clock::time_point> limit;
+    std::optional<Clock::time_point> limit = releaseLimit;
     for (const Running& each : running) {
         if (each.unlinkSequence != 0 && (!limit || each.unlinkLimit < *limit)) {
             limit = each.unlinkLimit;
@@ -303,7 +307,7 @@ void UsbIpDevice::Listen() {
         const std::lock_guard lock(mutex);
         connected = false;
         left.swap(running);
-        status = releasing ? TransferStatus::Cancelled : TransferStatus::DeviceGone;
+        status = releaseLimit ? TransferStatus::Cancelled : TransferStatus::DeviceGone;
     }
     for (const Running& each : left) {
         each.transfer->status = status;

@@ -32,6 +32,10 @@ UsbIpSocket::~UsbIpSocket() {
     }
 }
 
+void UsbIpSocket::ShutdownSending() {
+    shutdown(file, SHUT_WR);
+}
+
 void UsbIpSocket::Shutdown() {
     shutdown(file, SHUT_RDWR);
 }

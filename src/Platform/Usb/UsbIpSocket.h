@@ -31,6 +31,8 @@ class UsbIpSocket final {
     /// From then on `Receive` fails, whatever it waits for; nothing takes the limit away. Any thread.
     void ReceiveUntil(std::optional<Clock::time_point> time);
 
+    /// Tells the peer that nothing more will be sent. Any thread.
+    void ShutdownSending();
     /// Makes every operation fail, also one that waits. Any thread.
     void Shutdown();
 
