@@ -22,6 +22,8 @@ namespace Varnholt::Platform {
 /// block or hand over: waits, sleeps, signals, releases, `StartThread`. (`CallAt`, `Forget` and the time
 /// queries do not hand over.) Other threads, such as `std::thread`s, may signal and poll but not block.
 ///
+/// Named objects that are made under this clock are the process's own.
+///
 /// One at a time; made and ended while no other thread is inside a platform call. The end waits, in virtual
 /// time, for the clock's threads to end, and drops the events that are left.
 class VirtualClock final {

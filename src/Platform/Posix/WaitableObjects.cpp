@@ -8,8 +8,8 @@
 #include "Platform/Posix/EventObject.h"
 #include "Platform/Posix/HandleTable.h"
 #include "Platform/Posix/MutexObject.h"
+#include "Platform/Posix/NamedObjects.h"
 #include "Platform/Posix/SemaphoreObject.h"
-#include "Platform/Posix/SharedObjects.h"
 
 namespace Varnholt::Platform {
 namespace {
@@ -81,7 +81,7 @@ Handle MakeMutex(const std::string& name) {
         return NoHandle;
     }
     return HandleOf(
-        [&] { return AddIfMade(name.empty() ? std::make_shared<MutexObject>() : OpenSharedMutex(name)); });
+        [&] { return AddIfMade(name.empty() ? std::make_shared<MutexObject>() : OpenNamedMutex(name)); });
 }
 
 bool ReleaseMutex(Handle mutex) {
@@ -99,7 +99,7 @@ Handle MakeSemaphore(std::int32_t initialCount, std::int32_t maximumCount, const
     }
     return HandleOf([&] {
         return AddIfMade(name.empty() ? std::make_shared<LocalSemaphore>(initialCount, maximumCount)
-                                      : OpenSharedSemaphore(initialCount, maximumCount, name));
+                                      : OpenNamedSemaphore(initialCount, maximumCount, name));
     });
 }
 

@@ -2,15 +2,16 @@
 #include <gtest/gtest.h>
 #include <sys/file.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <filesystem>
 #include <fstream>
 #include <functional>
+#include <set>
 
 #include "Platform/ErrorCodes.h"
 #include "Platform/Posix/SharedFile.h"
-#include "Platform/Posix/SharedObjects.h"
 #include "Platform/WaitableObjects.h"
 #include "UniqueName.h"
 

@@ -4,15 +4,12 @@
 #include <memory>
 #include <string>
 
-#include "Platform/Posix/MutexObject.h"
 #include "Platform/Posix/SemaphoreObject.h"
 
 namespace Varnholt::Platform::Posix {
 
-/// The objects that have a name, and are one for all processes. Null on failure with the reason in
-/// `LastError`.
-std::shared_ptr<MutexObject> OpenSharedMutex(const std::string& name);
-/// The counts are those of the first process that opens the name.
+/// The semaphore that all processes of the user share under this name; the counts are those of the first that
+/// opens it. Null on failure with the reason in `LastError`.
 std::shared_ptr<SemaphoreObject> OpenSharedSemaphore(std::int32_t initialCount, std::int32_t maximumCount,
                                                      const std::string& name);
 
