@@ -255,43 +255,41 @@ class Checker final {
             const bool isUntouched =
                 std::all_of(numbers.begin(), numbers.end(), [](double number) { return number == -1; });
             untouched += isUntouched ? std::size_t{1} : std::size_t{0};
-        }) ? 1
-                                                                                                        : 0;
-    }
-    Add(Severity::Fine, CalibrationArea, fmt::format("{} values", calibration.GetItemCount()));
-    if (!odd.empty()) {
-        Add(Severity::Warning, CalibrationArea, "values that are no numbers: " + Listed(odd));
-    }
-    if (untouched > 0) {
-        Add(Severity::Note, CalibrationArea,
-            fmt::format("{} values are -1, as in a fresh instrument", untouched));
-    }
-}
-
-    void CheckOtherAreas() {
-    const std::size_t binary = CountUsed(bytes.subspan(Map::BinaryFirst, Map::BinaryFirstSize)) +
-                               CountUsed(bytes.subspan(Map::BinarySecond, Map::BinarySecondSize));
-    Add(Severity::Fine, "binary block",
-        binary == 0 ? "empty" : fmt::format("{} of {} bytes used", binary, Map::BinarySize));
-    std::set<std::uint32_t> words;
-    for (std::uint32_t at = Map::RawWords; at < Map::EndOfLogArea; ++at) {
-        if (image[at] != 0xFF) {
-            words.insert((at - Map::RawWords) / Map::RawWordSize);
+        }
+        Add(Severity::Fine, CalibrationArea, fmt::format("{} values", calibration.GetItemCount()));
+        if (!odd.empty()) {
+            Add(Severity::Warning, CalibrationArea, "values that are no numbers: " + Listed(odd));
+        }
+        if (untouched > 0) {
+            Add(Severity::Note, CalibrationArea,
+                fmt::format("{} values are -1, as in a fresh instrument", untouched));
         }
     }
-    Add(Severity::Fine, "raw words",
-        words.empty() ? "empty"
-                      : fmt::format("{} of {} used", words.size(),
-                                    (Map::EndOfLogArea - Map::RawWords) / Map::RawWordSize));
-    const std::size_t rest = CountUsed(bytes.subspan(Map::Calibration + Map::CalibrationSize));
-    if (rest > 0) {
-        Add(Severity::Note, "rest", fmt::format("{} bytes behind the calibration data are used", rest));
-    }
-}
 
-const EepromImage& image;
-const std::span<const std::uint8_t> bytes;
-std::vector<ImageFinding> findings;
+    void CheckOtherAreas() {
+        const std::size_t binary = CountUsed(bytes.subspan(Map::BinaryFirst, Map::BinaryFirstSize)) +
+                                   CountUsed(bytes.subspan(Map::BinarySecond, Map::BinarySecondSize));
+        Add(Severity::Fine, "binary block",
+            binary == 0 ? "empty" : fmt::format("{} of {} bytes used", binary, Map::BinarySize));
+        std::set<std::uint32_t> words;
+        for (std::uint32_t at = Map::RawWords; at < Map::EndOfLogArea; ++at) {
+            if (image[at] != 0xFF) {
+                words.insert((at - Map::RawWords) / Map::RawWordSize);
+            }
+        }
+        Add(Severity::Fine, "raw words",
+            words.empty() ? "empty"
+                          : fmt::format("{} of {} used", words.size(),
+                                        (Map::EndOfLogArea - Map::RawWords) / Map::RawWordSize));
+        const std::size_t rest = CountUsed(bytes.subspan(Map::Calibration + Map::CalibrationSize));
+        if (rest > 0) {
+            Add(Severity::Note, "rest", fmt::format("{} bytes behind the calibration data are used", rest));
+        }
+    }
+
+    const EepromImage& image;
+    const std::span<const std::uint8_t> bytes;
+    std::vector<ImageFinding> findings;
 };
 
 }  // namespace
