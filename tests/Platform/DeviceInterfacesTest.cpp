@@ -1,6 +1,8 @@
 #include <gtest/gtest.h>
 
-#include <cstring>
+#include <algorithm>
+#include <functional>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -54,7 +56,8 @@ class Interfaces : public testing::Test {
 
 std::vector<std::byte> Detail(std::size_t size, std::uint32_t sizeField = InterfaceDetailSizeField) {
     std::vector<std::byte> detail(size, std::byte{0xEE});
-    std::memcpy(detail.data(), &sizeField, std::min(size, sizeof sizeField));
+    const auto field = std::as_bytes(std::span(&sizeField, 1));
+    std::copy_n(field.begin(), std::min(size, field.size()), detail.begin());
     return detail;
 }
 

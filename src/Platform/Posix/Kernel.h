@@ -11,8 +11,9 @@
 /// The part of the platform that Windows keeps in its kernel: objects that threads wait for.
 ///
 /// One lock, the kernel lock, guards every waitable object, every thread record and the virtual clock. It is
-/// held for a few instructions at a time and never while anything outside this folder is called. Nothing else
-/// may be locked while it is held, except the handle table's own lock never: handles are looked up before.
+/// held for a few instructions at a time, and nothing outside this folder is called meanwhile. No other lock
+/// is waited for while it is held: handles are looked up before, and the locks of critical sections only
+/// tried.
 namespace Varnholt::Platform::Posix {
 
 class MutexObject;
@@ -28,10 +29,11 @@ class ThreadRecord final {
 
     const std::uint32_t number;  ///< for messages
 
-    // All guarded by the kernel lock, except the last two, which only the thread itself uses.
+    // All guarded by the kernel lock, except the last three, which only the thread itself uses.
     std::condition_variable turn;
     std::vector<std::shared_ptr<MutexObject>> owned;
     int priority = 0;
+    int niceShift = 0;  ///< what the priority has changed of the thread's nice value
     unsigned sectionsHeld = 0;
 
     // For the virtual clock.

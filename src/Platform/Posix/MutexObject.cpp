@@ -12,6 +12,7 @@ WaitableObject::Taken MutexObject::TryTake(ThreadRecord& taker) {
     if (owner) {
         return Taken::No;
     }
+    taker.owned.reserve(taker.owned.size() + 1);  // nothing may fail once the mutex is taken
     const Taken taken = TakeFree();
     if (taken != Taken::No) {
         taker.owned.push_back(shared_from_this());

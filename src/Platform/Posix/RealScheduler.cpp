@@ -8,6 +8,11 @@
 #include "Platform/Posix/SystemThread.h"
 
 namespace Varnholt::Platform::Posix {
+namespace {
+
+constexpr Microseconds LongestStep = 3'600'000'000;
+
+}  // namespace
 
 EventScheduler::EventId NewEventId() {
     static std::atomic<EventScheduler::EventId> last = 0;
@@ -82,7 +87,9 @@ void RealScheduler::CallEvents() {
         const auto next = events.begin();
         const Microseconds time = next->first.first;
         if (time > Now()) {
-            const std::chrono::steady_clock::time_point then{std::chrono::microseconds(time)};
+            // A time so far off that the system's clock could not hold it is approached in steps.
+            const Microseconds step = std::min(time, Now() + LongestStep);
+            const std::chrono::steady_clock::time_point then{std::chrono::microseconds(step)};
             changed.wait_until(hold, then);
             continue;
         }

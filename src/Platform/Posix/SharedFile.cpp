@@ -142,8 +142,8 @@ struct SharedFile::Attempts {
             return Fail(CodeOf(errno));
         }
         if (!S_ISREG(state.st_mode) || state.st_uid != geteuid()) {
-            return Fail(
-                Errors::AccessDenied);  // also for who could open it: its owner may write anything into it
+            // Also for who could open it: its owner may write anything into it.
+            return Fail(Errors::AccessDenied);
         }
         if (flock(file->Get(), LOCK_SH | LOCK_NB) != 0) {
             return errno == EWOULDBLOCK ? Attempt() : Fail(CodeOf(errno));

@@ -110,17 +110,18 @@ bool SetCurrentThreadPriority(int level) {
         SetLastError(Errors::InvalidParameter);
         return false;
     }
-    int& priority = CurrentThread().priority;
+    ThreadRecord& me = CurrentThread();
     // A level below normal is only remembered: a thread that has become nicer may not go back without a
     // privilege. A level that is refused is remembered too, so that callers find what they have set.
-    const int niceBefore = -NicePerLevel * (priority > 0 ? priority : 0);
-    const int niceNow = -NicePerLevel * (level > 0 ? level : 0);
-    if (niceNow != niceBefore) {
+    const int shift = level > 0 ? -NicePerLevel * level : 0;
+    if (shift != me.niceShift) {
         const auto self = static_cast<id_t>(gettid());
-        const int own = getpriority(PRIO_PROCESS, self);
-        static_cast<void>(setpriority(PRIO_PROCESS, self, own - niceBefore + niceNow));
+        const int own = getpriority(PRIO_PROCESS, self) - me.niceShift;
+        if (setpriority(PRIO_PROCESS, self, own + shift) == 0) {
+            me.niceShift = shift;
+        }
     }
-    priority = level;
+    me.priority = level;
     return true;
 }
 

@@ -1,6 +1,7 @@
 #include "Platform/Posix/WaitableObject.h"
 
 #include <algorithm>
+#include <vector>
 
 namespace Varnholt::Platform::Posix {
 namespace {
@@ -15,14 +16,16 @@ constexpr Microseconds LongestLook = 4000;
 class Waiter final : public BlockedCall {
   public:
     Waiter(ThreadRecord& caller, std::span<const ObjectRef> waitedFor)
-        : BlockedCall(caller), objects(waitedFor) {
-        for (const auto& object : objects) {
-            object->waiters.push_back(this);
+        : BlockedCall(caller), objects(waitedFor), entriesOfMany(objects.size() > 1 ? objects.size() : 0) {
+        for (std::size_t i = 0; i < objects.size(); ++i) {
+            WaitEntry& entry = Entries()[i];
+            entry.waiter = this;
+            objects[i]->Enqueue(entry);
         }
     }
     ~Waiter() {
-        for (const auto& object : objects) {
-            object->waiters.remove(this);
+        for (std::size_t i = 0; i < objects.size(); ++i) {
+            objects[i]->Dequeue(Entries()[i]);
         }
     }
 
@@ -62,19 +65,35 @@ class Waiter final : public BlockedCall {
     }
 
   private:
+    WaitEntry* Entries() { return entriesOfMany.empty() ? &entryOfOne : entriesOfMany.data(); }
+
     const std::span<const ObjectRef> objects;
+    WaitEntry entryOfOne;  // most waits are for one object, and take no memory
+    std::vector<WaitEntry> entriesOfMany;
     WaitAnyResult outcome{WaitResult::TimedOut, 0};
 };
 
+void WaitableObject::Enqueue(WaitEntry& entry) {
+    entry.previous = last;
+    (last ? last->next : first) = &entry;
+    last = &entry;
+}
+
+void WaitableObject::Dequeue(WaitEntry& entry) {
+    (entry.previous ? entry.previous->next : first) = entry.next;
+    (entry.next ? entry.next->previous : last) = entry.previous;
+}
+
 void WaitableObject::OfferToWaiters() {
-    for (Waiter* const waiter : waiters) {
-        if (waiter->IsSatisfied()) {
+    for (const WaitEntry* entry = first; entry; entry = entry->next) {
+        Waiter& waiter = *entry->waiter;
+        if (waiter.IsSatisfied()) {
             continue;
         }
-        if (CanBeTakenForOthers() && !waiter->Offer(*this)) {
+        if (CanBeTakenForOthers() && !waiter.Offer(*this)) {
             return;
         }
-        CurrentClock().Wake(*waiter);
+        CurrentClock().Wake(waiter);
     }
 }
 

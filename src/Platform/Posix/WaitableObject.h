@@ -2,7 +2,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <list>
 #include <memory>
 #include <span>
 #include <string>
@@ -14,6 +13,13 @@
 namespace Varnholt::Platform::Posix {
 
 class Waiter;
+
+/// A wait's place in the queue of one of its objects.
+struct WaitEntry {
+    Waiter* waiter = nullptr;
+    WaitEntry* previous = nullptr;
+    WaitEntry* next = nullptr;
+};
 
 /// Something a thread can wait for. All operations with the kernel lock held unless they say otherwise.
 ///
@@ -51,7 +57,10 @@ class WaitableObject {
 
   private:
     friend class Waiter;
-    std::list<Waiter*> waiters;
+    void Enqueue(WaitEntry& entry);
+    void Dequeue(WaitEntry& entry);
+    WaitEntry* first = nullptr;  ///< has waited longest
+    WaitEntry* last = nullptr;
     friend class HandleTable;
     std::size_t handles = 0;
 };
