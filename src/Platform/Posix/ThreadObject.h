@@ -25,16 +25,14 @@ class ThreadObject final : public WaitableObject {
 
     pthread_t thread{};
     std::uint32_t number = 0;
+    /// Whether there is a thread of the system behind the object; of its maker.
+    void MustBeJoined(bool exists) { joined = !exists; }
 
   private:
     void JoinOnce();
 
     bool ended = false;  // guarded by the kernel lock
-    std::atomic<bool> joined = false;
-
-  public:
-    /// There is no thread to join, because it could not be made.
-    void NeverStarted() { joined = true; }
+    std::atomic<bool> joined = true;
 };
 
 }  // namespace Varnholt::Platform::Posix

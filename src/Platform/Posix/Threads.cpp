@@ -49,10 +49,6 @@ class Sleeping final : public BlockedCall {
 /// A thread's nice value is its own on Linux.
 constexpr int NicePerLevel = 5;
 
-}  // namespace
-
-namespace {
-
 Handle StartMadeThread(ThreadEntry entry, void* argument) {
     auto start = std::make_unique<Start>(Start{entry, argument, std::make_shared<ThreadObject>()});
     const std::shared_ptr<ThreadObject> object = start->object;
@@ -63,8 +59,9 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
         KernelHold hold(KernelLock());
         CurrentClock().ThreadMade(hold, record);
     }
+    object->MustBeJoined(true);
     if (!StartSystemThread(object->thread, RunThread, start.get())) {
-        object->NeverStarted();
+        object->MustBeJoined(false);
         {
             KernelHold hold(KernelLock());
             CurrentClock().ThreadNeverBegan(hold, record);
