@@ -1,13 +1,19 @@
 #include "Platform/Usb/UdevBus.h"
 
 #include <libudev.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <charconv>
+#include <cstdint>
+#include <ctime>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <memory>
+#include <mutex>
+#include <optional>
 #include <set>
 #include <string_view>
 
@@ -17,6 +23,15 @@
 
 namespace Varnholt::Platform::Usb {
 namespace {
+
+/// A file for each device that udev knows something about.
+constexpr const char* UdevDatabase = "/run/udev/data";
+constexpr std::int64_t NanosecondsPerSecond = 1'000'000'000;
+constexpr std::int64_t CoarsestTick = NanosecondsPerSecond / 20;
+
+/// What is plugged into a port ("1-1.2") and its interfaces ("1-1.2:1.0"), not root hubs: a machine can have
+/// dozens of them, and udev walks through /sys for each that it looks at.
+constexpr const char* PortPattern = "[1-9]*-[1-9]*";
 
 template <auto Release>
 struct ReleasedBy {
@@ -81,6 +96,7 @@ std::vector<UsbDeviceInfo> ListDevices(bool registeredOnly) {
         return devices;
     }
     udev_enumerate_add_match_subsystem(enumeration.get(), "usb");
+    udev_enumerate_add_match_sysname(enumeration.get(), PortPattern);
     if (registeredOnly) {
         udev_enumerate_add_match_property(enumeration.get(), InterfaceClassProperty, "*");
     } else {
@@ -109,18 +125,37 @@ std::set<std::uint8_t> EndpointAddresses(const std::string& systemPath) {
     return addresses;
 }
 
+/// When udev last wrote about any device; nothing where that cannot be told.
+std::optional<std::int64_t> LastChangeOfUdev() {
+    struct stat folder {};
+    if (stat(UdevDatabase, &folder) != 0) {
+        return std::nullopt;
+    }
+    return folder.st_mtim.tv_sec * NanosecondsPerSecond + folder.st_mtim.tv_nsec;
+}
+
+/// Whether a later change is sure to get another time: file systems take theirs from a clock with coarse
+/// ticks.
+bool IsSettled(std::int64_t changed) {
+    timespec now{};
+    clock_gettime(CLOCK_REALTIME, &now);
+    return now.tv_sec * NanosecondsPerSecond + now.tv_nsec - changed > CoarsestTick;
+}
+
+/// Opening an instrument asks some ten times what is there: what udev says is kept until it says something
+/// new.
 class UdevBus final : public UsbBus {
   public:
     std::vector<std::string> List() override {
         std::vector<std::string> names;
-        for (const UsbDeviceInfo& device : ListRegisteredDevices()) {
+        for (const UsbDeviceInfo& device : Present()) {
             names.push_back(device.name);
         }
         return names;
     }
 
     std::shared_ptr<UsbDevice> Open(const std::string& name, ErrorCode& error) override {
-        for (const UsbDeviceInfo& device : ListRegisteredDevices()) {
+        for (const UsbDeviceInfo& device : Present()) {
             if (device.name == name) {
                 return OpenLibUsbDevice(device.deviceNode, error);
             }
@@ -128,6 +163,25 @@ class UdevBus final : public UsbBus {
         error = Errors::FileNotFound;
         return nullptr;
     }
+
+  private:
+    std::vector<UsbDeviceInfo> Present() {
+        const std::lock_guard lock(mutex);
+        const std::optional<std::int64_t> changed = LastChangeOfUdev();
+        if (!keptSince || keptSince != changed) {
+            kept = ListRegisteredDevices();
+            keptSince = changed && IsSettled(*changed) ? changed : std::nullopt;
+        }
+        std::vector<UsbDeviceInfo> present;
+        std::ranges::copy_if(kept, std::back_inserter(present), [](const UsbDeviceInfo& device) {
+            return access(device.deviceNode.c_str(), F_OK) == 0;  // unplugged, and udev did not get to it yet
+        });
+        return present;
+    }
+
+    std::mutex mutex;  // guards what follows
+    std::vector<UsbDeviceInfo> kept;
+    std::optional<std::int64_t> keptSince;
 };
 
 }  // namespace
