@@ -1,7 +1,9 @@
 #pragma once
 
+#include <condition_variable>
 #include <cstdint>
 #include <limits>
+#include <memory>
 #include <mutex>
 
 #include "Platform/EventScheduler.h"
@@ -17,8 +19,39 @@ class WaitableObject;
 using Microseconds = std::uint64_t;
 inline constexpr Microseconds Never = std::numeric_limits<Microseconds>::max();
 
+/// Wakes one thread. Shared, so that it can be rung after its thread has ended.
+using Bell = std::shared_ptr<std::condition_variable>;
+
 /// The kernel lock, held. See Kernel.h.
-using KernelHold = std::unique_lock<std::mutex>;
+class KernelHold final : private std::unique_lock<std::mutex> {
+  public:
+    KernelHold();
+    ~KernelHold();
+    KernelHold(const KernelHold&) = delete;
+    KernelHold& operator=(const KernelHold&) = delete;
+
+    using std::unique_lock<std::mutex>::lock;
+    void unlock();
+
+    /// Waits on `bell` until `condition` holds, and not beyond `end`; the lock is let go of meanwhile.
+    template <class Condition>
+    void Wait(std::condition_variable& bell, Condition condition) {
+        RingKept();
+        bell.wait(*this, condition);
+    }
+    template <class Condition, class TimePoint>
+    void Wait(std::condition_variable& bell, TimePoint end, Condition condition) {
+        RingKept();
+        bell.wait_until(*this, end, condition);
+    }
+
+    /// Of whoever has the lock: rings when it is let go of. Rung at once, the bell would wake a thread only
+    /// for it to wait for the lock.
+    static void RingOnRelease(const Bell& bell);
+
+  private:
+    static void RingKept();
+};
 
 /// What every blocking call goes through. The operations that take a `KernelHold` are called with the kernel
 /// lock held and return with it held; while they block they let go of it.

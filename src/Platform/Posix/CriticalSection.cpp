@@ -44,7 +44,7 @@ struct CriticalSection::Impl {
 };
 
 void CriticalSection::Impl::EnterInTurn(ThreadRecord& me, Clock& clock) {
-    KernelHold hold(KernelLock());
+    KernelHold hold;
     clock.Preempt(hold);
     const bool takesTurns = me.state == ThreadRecord::State::Running;
     while (!lock.try_lock()) {
@@ -69,7 +69,7 @@ void CriticalSection::Impl::EnterInTurn(ThreadRecord& me, Clock& clock) {
 }
 
 void CriticalSection::Impl::LeaveInTurn(Clock& clock) {
-    KernelHold hold(KernelLock());
+    KernelHold hold;
     lock.unlock();
     for (EnteringSection* const call : entering) {
         clock.Wake(*call);

@@ -23,7 +23,7 @@ HandleTable& HandleTable::Instance() {
 
 Handle HandleTable::Add(ObjectRef object) {
     {
-        const KernelHold hold(KernelLock());
+        const KernelHold hold;
         ++object->handles;
     }
     const std::unique_lock held(lock);
@@ -61,7 +61,7 @@ bool HandleTable::Close(Handle handle) {
         return false;
     }
     ThreadRecord& me = CurrentThread();
-    const KernelHold hold(KernelLock());
+    const KernelHold hold;
     if (--object->handles == 0) {
         object->LastHandleClosed(me);
     }

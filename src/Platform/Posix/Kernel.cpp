@@ -3,7 +3,9 @@
 #include <pthread.h>
 
 #include <atomic>
+#include <utility>
 
+#include "Platform/Posix/Immortal.h"
 #include "Platform/Posix/MutexObject.h"
 #include "Platform/Posix/RealClock.h"
 #include "Platform/WaitableObjects.h"
@@ -12,6 +14,7 @@ namespace Varnholt::Platform::Posix {
 namespace {
 
 std::mutex kernelLock;
+Immortal<Bell> bellToRing;  // when the lock is let go of; guarded by it
 std::atomic<Clock*> installedClock = nullptr;
 std::atomic<std::uint32_t> threadCount = 0;
 
@@ -57,8 +60,31 @@ class EndOfThreadHook final {
 
 }  // namespace
 
-std::mutex& KernelLock() {
-    return kernelLock;
+KernelHold::KernelHold() : std::unique_lock<std::mutex>(kernelLock) {}
+
+KernelHold::~KernelHold() {
+    if (owns_lock()) {
+        unlock();
+    }
+}
+
+void KernelHold::unlock() {
+    const Bell bell = std::exchange(*bellToRing, nullptr);
+    std::unique_lock<std::mutex>::unlock();
+    if (bell) {
+        bell->notify_one();
+    }
+}
+
+void KernelHold::RingOnRelease(const Bell& bell) {
+    RingKept();  // one place is enough: hardly anybody wakes two
+    *bellToRing = bell;
+}
+
+void KernelHold::RingKept() {
+    if (const Bell bell = std::exchange(*bellToRing, nullptr)) {
+        bell->notify_one();
+    }
 }
 
 ThreadRecord::ThreadRecord() : number(++threadCount) {}
@@ -77,7 +103,7 @@ ThreadRecord* BindCurrentThread(ThreadRecord* thread) {
 
 void AbandonOwned(ThreadRecord& thread) {
     std::vector<std::shared_ptr<MutexObject>> abandoned;  // may die with this, after the lock is gone
-    const KernelHold hold(kernelLock);
+    const KernelHold hold;
     abandoned.swap(thread.owned);
     for (const auto& mutex : abandoned) {
         mutex->Abandon();

@@ -1,8 +1,6 @@
 #pragma once
 
-#include <condition_variable>
 #include <memory>
-#include <mutex>
 #include <string>
 #include <vector>
 
@@ -18,8 +16,6 @@ namespace Varnholt::Platform::Posix {
 
 class MutexObject;
 
-std::mutex& KernelLock();
-
 /// One thread as the platform knows it. Made for a thread at its first platform call, or by `StartThread`.
 class ThreadRecord final {
   public:
@@ -30,7 +26,7 @@ class ThreadRecord final {
     const std::uint32_t number;  ///< for messages
 
     // All guarded by the kernel lock, except the last three, which only the thread itself uses.
-    std::condition_variable turn;
+    const Bell turn = std::make_shared<std::condition_variable>();
     std::vector<std::shared_ptr<MutexObject>> owned;
     int priority = 0;
     int niceShift = 0;  ///< what the priority has changed of the thread's nice value

@@ -44,16 +44,16 @@ EventScheduler& RealClock::Scheduler() {
 void RealClock::Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) {
     const auto woken = [&call] { return call.woken; };
     if (deadline == Never) {
-        call.thread.turn.wait(hold, woken);
+        hold.Wait(*call.thread.turn, woken);
     } else {
         const steady_clock::time_point end{std::chrono::microseconds(deadline)};
-        call.thread.turn.wait_until(hold, end, woken);
+        hold.Wait(*call.thread.turn, end, woken);
     }
 }
 
 void RealClock::Wake(BlockedCall& call) {
     call.woken = true;
-    call.thread.turn.notify_one();
+    KernelHold::RingOnRelease(call.thread.turn);
 }
 
 void RealClock::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,

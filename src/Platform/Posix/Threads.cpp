@@ -26,13 +26,13 @@ void* RunThread(void* argument) {
     ThreadRecord& record = *start->record;
     BindCurrentThread(&record);
     {
-        KernelHold hold(KernelLock());
+        KernelHold hold;
         CurrentClock().ThreadBegins(hold, record);
     }
     start->entry(start->argument);
     AbandonOwned(record);
     {
-        KernelHold hold(KernelLock());
+        KernelHold hold;
         start->object->End();
         CurrentClock().ThreadEnds(hold, record);
     }
@@ -56,14 +56,14 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
     object->number = record.number;
     const Handle handle = HandleTable::Instance().Add(object);
     {
-        KernelHold hold(KernelLock());
+        KernelHold hold;
         CurrentClock().ThreadMade(hold, record);
     }
     object->MustBeJoined(true);
     if (!StartSystemThread(object->thread, RunThread, start.get())) {
         object->MustBeJoined(false);
         {
-            KernelHold hold(KernelLock());
+            KernelHold hold;
             CurrentClock().ThreadNeverBegan(hold, record);
         }
         Close(handle);
@@ -71,7 +71,7 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
         return NoHandle;
     }
     static_cast<void>(start.release());  // the thread's now
-    KernelHold hold(KernelLock());
+    KernelHold hold;
     CurrentClock().Preempt(hold);
     return handle;
 }
@@ -123,7 +123,7 @@ bool SetCurrentThreadPriority(int level) {
 }
 
 void SleepMilliseconds(std::uint32_t milliseconds) {
-    KernelHold hold(KernelLock());
+    KernelHold hold;
     if (milliseconds == 0) {
         CurrentClock().GiveUpSlice(hold);
         return;

@@ -39,14 +39,14 @@ VirtualTime::VirtualTime(std::uint64_t seed)
       installer(CurrentThread()),
       threads{&hostedEvent, &eventThread, &installer},
       threadsAtRest(threads.size()) {
-    const KernelHold hold(KernelLock());
+    const KernelHold hold;
     installer.state = State::Running;
     InstallClock(this);
 }
 
 VirtualTime::~VirtualTime() {
     decltype(events) dropped;
-    KernelHold hold(KernelLock());
+    KernelHold hold;
     WaitingForThreads call(installer);
     awaitingEnd = &call;
     while (threads.size() > threadsAtRest && !call.hopeless) {
@@ -60,7 +60,7 @@ VirtualTime::~VirtualTime() {
     installer.state = State::Unknown;
     InstallClock(nullptr);
     eventThreadMustEnd = true;
-    eventThread.turn.notify_one();
+    eventThread.turn->notify_one();
     hold.unlock();
     if (hasEventThread) {
         pthread_join(systemEventThread, nullptr);
@@ -68,7 +68,7 @@ VirtualTime::~VirtualTime() {
 }
 
 void VirtualTime::HandleDeadlock(VirtualClock::DeadlockHandler newHandler) {
-    const KernelHold hold(KernelLock());
+    const KernelHold hold;
     handler = std::move(newHandler);
 }
 
@@ -148,14 +148,14 @@ void VirtualTime::HandOver(KernelHold& hold, ThreadRecord& self) {
         }
         next->state = State::Running;
         if (next != &self) {
-            next->turn.notify_one();
+            next->turn->notify_one();
             AwaitTurn(hold, self);
         }
     }
 }
 
 void VirtualTime::AwaitTurn(KernelHold& hold, ThreadRecord& self) {
-    self.turn.wait(hold, [&self] { return self.state == State::Running || self.mustAdvance; });
+    hold.Wait(*self.turn, [&self] { return self.state == State::Running || self.mustAdvance; });
     self.mustAdvance = false;
 }
 
@@ -181,7 +181,7 @@ void VirtualTime::GiveUpSlice(KernelHold& hold) {
     if (next) {
         self.state = State::Ready;
         next->state = State::Running;
-        next->turn.notify_one();
+        next->turn->notify_one();
         AwaitTurn(hold, self);
         HandOver(hold, self);
     } else {
@@ -211,7 +211,7 @@ void VirtualTime::Advance(KernelHold& hold, ThreadRecord& self) {
             HostEvent(hold, self);
         } else {
             eventThreadMustCall = true;
-            eventThread.turn.notify_one();
+            eventThread.turn->notify_one();
             AwaitTurn(hold, self);
         }
         return;
@@ -230,12 +230,12 @@ void VirtualTime::Advance(KernelHold& hold, ThreadRecord& self) {
 void VirtualTime::PassOn() {
     if (ThreadRecord* const next = ChooseReady()) {
         next->state = State::Running;
-        next->turn.notify_one();
+        next->turn->notify_one();
         return;
     }
     const auto blocked = std::ranges::find(threads, State::Blocked, &ThreadRecord::state);
     (*blocked)->mustAdvance = true;
-    (*blocked)->turn.notify_one();
+    (*blocked)->turn->notify_one();
 }
 
 void VirtualTime::ThreadMade(KernelHold& /*hold*/, ThreadRecord& thread) {

@@ -18,7 +18,7 @@ class WaitingForEvent final : public BlockedCall {
 
 EventScheduler::EventId VirtualTime::CallAt(std::uint64_t time, std::function<void()> event) {
     const EventId id = NewEventId();
-    const KernelHold hold(KernelLock());
+    const KernelHold hold;
     events.emplace(std::pair(time, id), std::move(event));
     return id;
 }
@@ -26,7 +26,7 @@ EventScheduler::EventId VirtualTime::CallAt(std::uint64_t time, std::function<vo
 void VirtualTime::Forget(EventId id) {
     std::function<void()> dropped;
     ThreadRecord& self = CurrentThread();
-    KernelHold hold(KernelLock());
+    KernelHold hold;
     const auto found =
         std::ranges::find_if(events, [id](const auto& waiting) { return waiting.first.second == id; });
     if (found != events.end()) {
@@ -39,7 +39,7 @@ void VirtualTime::Forget(EventId id) {
             Block(hold, call, Never);
             std::erase(forgetting, &call);
         } else {
-            eventEnded.wait(hold, [this, id] { return running != id; });
+            hold.Wait(eventEnded, [this, id] { return running != id; });
         }
     }
     hold.unlock();
@@ -87,7 +87,7 @@ void VirtualTime::CallEvent(KernelHold& hold, ThreadRecord& as) {
 }
 
 void* VirtualTime::RunEventThread(void* time) {
-    KernelHold hold(KernelLock());
+    KernelHold hold;
     static_cast<VirtualTime*>(time)->ServeEvents(hold);
     return nullptr;
 }
@@ -95,7 +95,7 @@ void* VirtualTime::RunEventThread(void* time) {
 void VirtualTime::ServeEvents(KernelHold& hold) {
     BindCurrentThread(&eventThread);
     while (true) {
-        eventThread.turn.wait(hold, [this] { return eventThreadMustCall || eventThreadMustEnd; });
+        hold.Wait(*eventThread.turn, [this] { return eventThreadMustCall || eventThreadMustEnd; });
         if (eventThreadMustEnd) {
             BindCurrentThread(nullptr);
             return;

@@ -37,7 +37,7 @@ bool OnObject(Handle handle, Action action) {
     if (!object) {
         return false;
     }
-    KernelHold hold(KernelLock());
+    KernelHold hold;
     CurrentClock().Preempt(hold);
     const ErrorCode code = action(*object);
     CurrentClock().Preempt(hold);
@@ -49,7 +49,7 @@ WaitAnyResult WaitForObjects(std::span<const ObjectRef> objects, std::uint32_t t
     const Microseconds deadline = DeadlineAfter(timeout);
     WaitAnyResult outcome{};
     {
-        KernelHold hold(KernelLock());
+        KernelHold hold;
         CurrentClock().Preempt(hold);
         outcome = WaitForAny(hold, objects, deadline);
     }
@@ -147,7 +147,7 @@ WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) 
     const Microseconds deadline = DeadlineAfter(timeout);
     WaitResult result{};
     {
-        KernelHold hold(KernelLock());
+        KernelHold hold;
         CurrentClock().Preempt(hold);
         if (!Succeeded(signalled->Signal(CurrentThread()))) {
             return WaitResult::Failed;

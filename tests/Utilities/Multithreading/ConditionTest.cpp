@@ -1,6 +1,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <chrono>
 #include <string>
 #include <thread>
@@ -197,16 +198,16 @@ TEST_F(ConditionTest, BroadcastReportsAnEventItCannotWaitFor) {
 
 TEST_F(ConditionTest, WaiterThatCannotTakeTheMutexAgainSaysSo) {
     StartWaiters(1);
-    Platform::InstallCallFilter(
-        [waker = std::this_thread::get_id(), done = false](std::string_view call) mutable {
-            if (call != "Wait" || done || std::this_thread::get_id() == waker) {
-                return Platform::Errors::Success;
-            }
-            done = true;
-            return Platform::Errors::InvalidHandle;
-        });
+    std::atomic<bool> done = false;
+    Platform::InstallCallFilter([waker = std::this_thread::get_id(), &done](std::string_view call) {
+        if (call != "Wait" || std::this_thread::get_id() == waker || done.exchange(true)) {
+            return Platform::Errors::Success;
+        }
+        return Platform::Errors::InvalidHandle;
+    });
     condition.signal();
     Await([this] { return woken == 1; });
+    Platform::InstallCallFilter({});
     EXPECT_EQ(failure, "Condition::Wait() invalid mutex! (must be a real mutex)");
 }
 

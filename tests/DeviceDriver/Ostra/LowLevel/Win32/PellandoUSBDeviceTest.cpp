@@ -185,8 +185,8 @@ TEST_F(NativeDevice, HoldsTheDeviceLockThroughAStrip) {
     });
     SleepMilliseconds(10);
     Mutex mutex("native1");
-    EXPECT_FALSE(mutex.TryLock(80));
-    EXPECT_TRUE(mutex.TryLock(20));
+    EXPECT_FALSE(mutex.TryLock(60));
+    EXPECT_TRUE(mutex.TryLock(1000));
     mutex.Unlock();
 }
 
