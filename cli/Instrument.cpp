@@ -113,7 +113,7 @@ Instrument::Instrument(Session& session, const InstrumentOptions& options, Choic
         FailureReport report = Describe(std::current_exception());
         if (const std::string holder = HolderOf(identifier);
             report.code == ExitCode::NotAvailable && !holder.empty()) {
-            report.message = "used by another process: " + holder;
+            report.message = "in use by " + holder;
             report.advice = "end that program: an instrument belongs to one process at a time";
         }
         throw ToolFailure(report.code, identifier + ": " + report.message, report.advice);

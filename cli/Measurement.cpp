@@ -2,7 +2,6 @@
 
 #include <charconv>
 
-#include "Commands/CommandLine.h"
 #include "Interface/Readout.h"
 #include "Memory/RamAccess.h"
 #include "Protocol/ByteOrder.h"
@@ -15,6 +14,7 @@ using DeviceDriver::Generic::Configuration::Property;
 namespace Ids = Protocol::PropertyIds;
 namespace Fixed = Interface::FixedReadout;
 
+constexpr std::size_t ParameterCount = 4;
 constexpr std::int32_t HighestPositive = 0xF800;
 
 /// With the fixed parameters but for the time.
@@ -34,44 +34,48 @@ void SetIntegrationTime(Instrument& instrument, double seconds) {
     ram.Store(set);
 }
 
-/// Three 16-bit numbers and a byte.
+/// Three 16-bit numbers and a byte, with commas; empty where the text is something else.
 std::vector<std::uint16_t> ParseParameters(const std::string& text) {
     std::vector<std::uint16_t> parameters;
-    for (const std::string& part : CLI::detail::split(text, ',')) {
+    const char* at = text.data();
+    const char* const end = at + text.size();
+    while (parameters.size() < ParameterCount) {
         std::uint16_t number = 0;
-        const char* const end = part.data() + part.size();
-        const auto parsed = std::from_chars(part.data(), end, number);
-        if (parsed.ec != std::errc() || parsed.ptr != end) {
-            parameters.clear();
-            break;
+        const auto parsed = std::from_chars(at, end, number);
+        const bool isLast = parameters.size() + 1 == ParameterCount;
+        if (parsed.ec != std::errc() ||
+            (isLast ? parsed.ptr != end : parsed.ptr == end || *parsed.ptr != ',')) {
+            return {};
         }
         parameters.push_back(number);
+        at = isLast ? end : parsed.ptr + 1;
     }
-    if (parameters.size() != 4 || parameters.back() > 0xFF) {
-        throw CLI::ValidationError(
-            "--parameters", "'" + text + "': three numbers up to 65535 and one up to 255, with commas");
-    }
-    return parameters;
+    return parameters.back() > 0xFF ? std::vector<std::uint16_t>() : parameters;
+}
+
+std::string CheckParameters(const std::string& text) {
+    return ParseParameters(text).empty()
+               ? "'" + text + "': three numbers up to 65535 and one up to 255, with commas"
+               : "";
 }
 
 }  // namespace
 
-void AddMeasurementOptions(CLI::App* command, MeasurementOptions& options) {
-    const char* const group = "Measurement";
-    auto* const time = command
-                           ->add_option("--integration-time", options.integrationTime,
-                                        "integration time in seconds (default: the fixed 294 time units)")
-                           ->type_name("S")
-                           ->check(Silent(CLI::PositiveNumber))
-                           ->group(group);
+void AddMeasurementOptions(CommandSpec command, MeasurementOptions& options) {
+    const char* const heading = "Measurement";
     command
-        ->add_option_function<std::string>(
-            "--parameters",
-            [&options](const std::string& text) { options.parameters = ParseParameters(text); },
-            "the four measurement parameters as they are sent (default: 294,0,1,6)")
-        ->type_name("P1,P2,P3,P4")
-        ->excludes(time)
-        ->group(group);
+        .Add("--integration-time", options.integrationTime,
+             "integration time in seconds (default: the fixed 294 time units)")
+        .Type("S")
+        .Between(1e-9, 1e6)
+        .Group(heading);
+    command
+        .Add("--parameters", options.parameters,
+             "the four measurement parameters as they are sent (default: 294,0,1,6)")
+        .Type("P1,P2,P3,P4")
+        .Check(CheckParameters)
+        .Excludes("--integration-time")
+        .Group(heading);
 }
 
 void PrepareMeasurement(Session& session, Instrument& instrument, const MeasurementOptions& options) {
@@ -81,9 +85,9 @@ void PrepareMeasurement(Session& session, Instrument& instrument, const Measurem
     if (options.integrationTime > 0) {
         SetIntegrationTime(instrument, options.integrationTime);
     } else if (!options.parameters.empty()) {
-        instrument.Commands().SetMeasureParameters(options.parameters[0], options.parameters[1],
-                                                   options.parameters[2],
-                                                   static_cast<std::uint8_t>(options.parameters[3]));
+        const std::vector<std::uint16_t> p = ParseParameters(options.parameters);
+        instrument.Commands().SetMeasureParameters(p.at(0), p.at(1), p.at(2),
+                                                   static_cast<std::uint8_t>(p.at(3)));
     } else {
         instrument.Commands().SetMeasureParameters(Fixed::P1, Fixed::P2, Fixed::P3, Fixed::P4);
     }

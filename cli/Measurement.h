@@ -1,25 +1,23 @@
 #pragma once
 
 #include <cstdint>
+#include <span>
+#include <string>
 #include <vector>
 
+#include "CommandSpec.h"
 #include "Instrument.h"
-#include "Output/Json.h"
-
-namespace CLI {
-class App;
-}
 
 namespace Varnholt::Cli {
 
 /// How readouts and scans are taken. Nothing set: with the fixed parameters of the library's exported
 /// readout.
 struct MeasurementOptions {
-    double integrationTime = 0;             ///< seconds; 0: not set
-    std::vector<std::uint16_t> parameters;  ///< p1 to p4 as they are sent; empty: not set
+    double integrationTime = 0;  ///< seconds; 0: not set
+    std::string parameters;      ///< "P1,P2,P3,P4" as they are sent; empty: not set
 };
 
-void AddMeasurementOptions(CLI::App* command, MeasurementOptions& options);
+void AddMeasurementOptions(CommandSpec command, MeasurementOptions& options);
 
 /// Gives the instrument the time that it needs after its reset and sets its measurement parameters.
 void PrepareMeasurement(Session& session, Instrument& instrument, const MeasurementOptions& options);

@@ -4,6 +4,7 @@
 #include <ostream>
 
 #include "Instrument.h"
+#include "Output/Json.h"
 #include "Platform/HostQueries.h"
 
 namespace Varnholt::Cli {
@@ -33,6 +34,10 @@ Session::~Session() {
 
 std::string Session::Paint(const char* color, const std::string& text) const {
     return where.errFacts.showsColor ? "\x1b[" + std::string(color) + "m" + text + "\x1b[0m" : text;
+}
+
+void Session::Print(const nlohmann::ordered_json& value) {
+    PrintJson(where.out, value);
 }
 
 void Session::Note(const std::string& text) {

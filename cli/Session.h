@@ -2,11 +2,12 @@
 
 #include <functional>
 #include <iosfwd>
+#include <nlohmann/json_fwd.hpp>
+#include <optional>
 #include <string>
 
 #include "Failure.h"
 #include "Interruption.h"
-#include "Output/Json.h"
 #include "Output/Plot.h"
 #include "Output/Progress.h"
 #include "Platform/InterruptibleDeviceFiles.h"
@@ -33,7 +34,7 @@ class Session final {
 
     std::ostream& Out() { return where.out; }
     const StreamFacts& OutFacts() const { return where.outFacts; }
-    void Print(const Json& value) { PrintJson(where.out, value); }
+    void Print(const nlohmann::ordered_json& value);
 
     /// Messages, on standard error.
     void Note(const std::string& text);

@@ -3,16 +3,14 @@
 #include <memory>
 #include <string>
 
-namespace CLI {
-class App;
-}
+#include "CommandSpec.h"
 
 namespace Varnholt::Cli {
 
 class Session;
 
 /// Adds the commands that only this platform has.
-void AddSystemCommands(CLI::App& app, Session& session);
+void AddSystemCommands(CommandSpec app, Session& session);
 
 /// Prints the devices that could be instruments, as a table or JSON (--candidates of the list command).
 void PrintCandidates(Session& session, bool json);

@@ -1,5 +1,6 @@
 #include "Commands/Commands.h"
 #include "Failure.h"
+#include "Output/Json.h"
 #include "Output/Table.h"
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFileSystem.h"
@@ -39,7 +40,7 @@ std::unique_ptr<TrafficRecording> RecordTraffic(const std::string& file) {
     return std::make_unique<BusRecording>(file);
 }
 
-void AddSystemCommands(CLI::App& app, Session& session) {
+void AddSystemCommands(CommandSpec app, Session& session) {
     AddRegister(app, session);
     AddDoctor(app, session);
 }

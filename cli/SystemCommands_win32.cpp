@@ -3,7 +3,7 @@
 
 namespace Varnholt::Cli {
 
-void AddSystemCommands(CLI::App&, Session&) {}
+void AddSystemCommands(CommandSpec, Session&) {}
 
 void PrintCandidates(Session&, bool) {
     throw ToolFailure(ExitCode::Usage, "Windows shows its USB devices in the device manager",

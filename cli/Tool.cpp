@@ -36,9 +36,9 @@ void BuildCommandLine(CLI::App& app, Session& session) {
     static std::string captureFile;  // read by `CaptureFileIn`; here for the help
     app.add_option("--capture", captureFile, "record the USB traffic in a pcapng file")->type_name("FILE");
     for (const AddCommand add : Commands) {
-        add(app, session);
+        add(CommandSpec(&app), session);
     }
-    AddSystemCommands(app, session);
+    AddSystemCommands(CommandSpec(&app), session);
     app.footer(Footer);  // after the commands, which would inherit it
 }
 

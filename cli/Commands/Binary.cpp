@@ -1,8 +1,9 @@
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "Memory/ImageEdit.h"
 #include "Memory/MemoryTarget.h"
 #include "Output/AtomicFile.h"
+#include "Output/Json.h"
 #include "Protocol/EepromMap.h"
 
 namespace Varnholt::Cli {
@@ -49,19 +50,18 @@ void Put(Session& session, const PutOptions& options) {
 
 }  // namespace
 
-void AddBinary(CLI::App& app, Session& session) {
-    CLI::App* const group = app.add_subcommand("binary", "read and write the binary block of 1904 bytes");
-    group->require_subcommand(1);
+void AddBinary(CommandSpec app, Session& session) {
+    CommandSpec group = app.AddGroup("binary", "read and write the binary block of 1904 bytes");
 
     const auto get = std::make_shared<GetOptions>();
-    CLI::App* command = group->add_subcommand("get", "save the binary block in a file");
-    command->add_option("FILE", get->file, "is replaced when complete")->required();
+    CommandSpec command = group.AddCommand("get", "save the binary block in a file");
+    command.Add("FILE", get->file, "is replaced when complete").Required();
     AddMemoryOptions(command, get->memory);
     SetAction(command, session, get, Get);
 
     const auto put = std::make_shared<PutOptions>();
-    command = group->add_subcommand("put", "write the binary block from a file");
-    command->add_option("FILE", put->file, "1904 bytes")->required();
+    command = group.AddCommand("put", "write the binary block from a file");
+    command.Add("FILE", put->file, "1904 bytes").Required();
     AddChangeOptions(command, put->change);
     AddMemoryOptions(command, put->memory);
     SetAction(command, session, put, Put);

@@ -1,10 +1,11 @@
 #include <fmt/format.h>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "Memory/ImageEdit.h"
 #include "Memory/ImageModel.h"
 #include "Memory/MemoryTarget.h"
+#include "Output/Json.h"
 #include "Output/Table.h"
 #include "Output/ValueList.h"
 
@@ -57,22 +58,20 @@ void Set(Session& session, const SetOptions& options) {
 
 }  // namespace
 
-void AddCalibration(CLI::App& app, Session& session) {
-    CLI::App* const group = app.add_subcommand("calibration", "show and set calibration values");
-    group->require_subcommand(1);
+void AddCalibration(CommandSpec app, Session& session) {
+    CommandSpec group = app.AddGroup("calibration", "show and set calibration values");
 
     const auto show = std::make_shared<ShowOptions>();
-    CLI::App* command = group->add_subcommand("show", "show the calibration values");
+    CommandSpec command = group.AddCommand("show", "show the calibration values");
     AddMemoryOptions(command, show->memory);
     SetAction(command, session, show, Show);
 
     const auto set = std::make_shared<SetOptions>();
-    command = group->add_subcommand(
+    command = group.AddCommand(
         "set",
         "set calibration values: the EEPROM is read, changed as a whole and proven, backed up, written "
         "where it differs, and read back");
-    command->add_option("ID=VALUE", set->assignments, "new values; elements with commas: 1000=0.5,1.5")
-        ->required();
+    command.Add("ID=VALUE", set->assignments, "new values; elements with commas: 1000=0.5,1.5").Required();
     AddChangeOptions(command, set->change);
     AddMemoryOptions(command, set->memory);
     SetAction(command, session, set, Set);

@@ -2,34 +2,32 @@
 
 #include <array>
 
-namespace CLI {
-class App;
-}
+#include "CommandSpec.h"
 
 namespace Varnholt::Cli {
 
 class Session;
 
 /// Each adds one command, or a group of them, to the command line; the file of that name holds it.
-void AddList(CLI::App& app, Session& session);
-void AddReadout(CLI::App& app, Session& session);
-void AddScan(CLI::App& app, Session& session);
-void AddIdentify(CLI::App& app, Session& session);
-void AddReset(CLI::App& app, Session& session);
-void AddMonitor(CLI::App& app, Session& session);
-void AddWriteImage(CLI::App& app, Session& session);
-void AddEeprom(CLI::App& app, Session& session);
-void AddCalibration(CLI::App& app, Session& session);
-void AddLog(CLI::App& app, Session& session);
-void AddRam(CLI::App& app, Session& session);
-void AddBinary(CLI::App& app, Session& session);
-void AddWord(CLI::App& app, Session& session);
+void AddList(CommandSpec app, Session& session);
+void AddReadout(CommandSpec app, Session& session);
+void AddScan(CommandSpec app, Session& session);
+void AddIdentify(CommandSpec app, Session& session);
+void AddReset(CommandSpec app, Session& session);
+void AddMonitor(CommandSpec app, Session& session);
+void AddWriteImage(CommandSpec app, Session& session);
+void AddEeprom(CommandSpec app, Session& session);
+void AddCalibration(CommandSpec app, Session& session);
+void AddLog(CommandSpec app, Session& session);
+void AddRam(CommandSpec app, Session& session);
+void AddBinary(CommandSpec app, Session& session);
+void AddWord(CommandSpec app, Session& session);
 
 /// On Linux only; see SystemCommands.h.
-void AddRegister(CLI::App& app, Session& session);
-void AddDoctor(CLI::App& app, Session& session);
+void AddRegister(CommandSpec app, Session& session);
+void AddDoctor(CommandSpec app, Session& session);
 
-using AddCommand = void (*)(CLI::App& app, Session& session);
+using AddCommand = void (*)(CommandSpec app, Session& session);
 
 /// The commands in the order in which the help lists them.
 inline constexpr std::array Commands{

@@ -1,8 +1,9 @@
 #include <ostream>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "Linux/Diagnosis.h"
+#include "Output/Json.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -55,14 +56,13 @@ void Doctor(Session& session, const Options& options) {
 
 }  // namespace
 
-void AddDoctor(CLI::App& app, Session& session) {
+void AddDoctor(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
-    CLI::App* const command =
-        app.add_subcommand("doctor", "say why an instrument is not found or cannot be used, and what to do");
-    command->footer("Every instrument that is free is opened, and thereby reset, to see whether it answers.");
-    command
-        ->add_option("--transport", options->transport, "native or usbio; without it, as the machine prefers")
-        ->check(CLI::IsMember({"native", "usbio"}));
+    CommandSpec command =
+        app.AddCommand("doctor", "say why an instrument is not found or cannot be used, and what to do");
+    command.Footer("Every instrument that is free is opened, and thereby reset, to see whether it answers.");
+    command.Add("--transport", options->transport, "native or usbio; without it, as the machine prefers")
+        .OneOf({"native", "usbio"});
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, Doctor);
 }

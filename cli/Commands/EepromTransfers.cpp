@@ -1,12 +1,13 @@
 #include <fmt/format.h>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "Commands/Eeprom.h"
 #include "Memory/ImageCheck.h"
 #include "Memory/ImageModel.h"
 #include "Memory/MemoryTarget.h"
 #include "Output/AtomicFile.h"
+#include "Output/Json.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -97,10 +98,9 @@ void New(Session& session, const BackupOptions& options) {
     }
 }
 
-void AddWriteOptions(CLI::App* command, const std::shared_ptr<WriteOptions>& options) {
-    command->add_option("FILE", options->file, "image of 8192 bytes")->required();
-    command->add_flag("--force", options->force, "write an image that the driver cannot use")
-        ->group("Change");
+void AddWriteOptions(CommandSpec command, const std::shared_ptr<WriteOptions>& options) {
+    command.Add("FILE", options->file, "image of 8192 bytes").Required();
+    command.AddFlag("--force", options->force, "write an image that the driver cannot use").Group("Change");
     AddChangeOptions(command, options->change);
     AddInstrumentOptions(command, options->memory.instrument);
     AddJsonFlag(command, options->memory.json);
@@ -108,38 +108,37 @@ void AddWriteOptions(CLI::App* command, const std::shared_ptr<WriteOptions>& opt
 
 }  // namespace
 
-void AddEepromTransfers(CLI::App& group, Session& session) {
+void AddEepromTransfers(CommandSpec group, Session& session) {
     const auto backup = std::make_shared<BackupOptions>();
-    CLI::App* command = group.add_subcommand("backup", "save the EEPROM of an instrument in a file");
-    command->add_option("FILE", backup->file, "is replaced when the backup is complete")->required();
+    CommandSpec command = group.AddCommand("backup", "save the EEPROM of an instrument in a file");
+    command.Add("FILE", backup->file, "is replaced when the backup is complete").Required();
     AddInstrumentOptions(command, backup->memory.instrument);
     AddJsonFlag(command, backup->memory.json);
     SetAction(command, session, backup, Backup);
 
     const auto write = std::make_shared<WriteOptions>();
-    command = group.add_subcommand(
+    command = group.AddCommand(
         "write", "write an image the safe way: check it, make a backup, write what differs, read it back");
     AddWriteOptions(command, write);
     SetAction(command, session, write, Write);
 
     const auto restore = std::make_shared<WriteOptions>();
-    command = group.add_subcommand("restore", "write a backup back (as `write`, without a new backup)");
+    command = group.AddCommand("restore", "write a backup back (as `write`, without a new backup)");
     AddWriteOptions(command, restore);
     SetAction(command, session, restore, Restore);
 
     const auto fresh = std::make_shared<BackupOptions>();
-    command = group.add_subcommand("new", "make the image of a fresh instrument");
-    command->add_option("FILE", fresh->file, "is replaced when the image is complete")->required();
+    command = group.AddCommand("new", "make the image of a fresh instrument");
+    command.Add("FILE", fresh->file, "is replaced when the image is complete").Required();
     AddJsonFlag(command, fresh->memory.json);
     SetAction(command, session, fresh, New);
 }
 
-void AddEeprom(CLI::App& app, Session& session) {
-    CLI::App* const group =
-        app.add_subcommand("eeprom", "back up, write, restore, show, check and compare EEPROM images");
-    group->require_subcommand(1);
-    AddEepromTransfers(*group, session);
-    AddEepromViews(*group, session);
+void AddEeprom(CommandSpec app, Session& session) {
+    CommandSpec group =
+        app.AddGroup("eeprom", "back up, write, restore, show, check and compare EEPROM images");
+    AddEepromTransfers(group, session);
+    AddEepromViews(group, session);
 }
 
 }  // namespace Varnholt::Cli

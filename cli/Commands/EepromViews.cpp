@@ -3,13 +3,14 @@
 
 #include <algorithm>
 
-#include "Commands/CommandLine.h"
+#include "Commands/CommonOptions.h"
 #include "Commands/Eeprom.h"
 #include "Memory/ImageCheck.h"
 #include "Memory/ImageDiff.h"
 #include "Memory/ImageEdit.h"
 #include "Memory/ImageModel.h"
 #include "Memory/MemoryTarget.h"
+#include "Output/Json.h"
 #include "Output/Table.h"
 #include "Output/ValueList.h"
 #include "Protocol/ByteOrder.h"
@@ -28,11 +29,11 @@ struct ViewOptions {
 };
 
 /// The view commands take the image as their argument.
-void AddViewOptions(CLI::App* command, const std::shared_ptr<ViewOptions>& options) {
-    auto* const file = command->add_option("FILE", options->memory.imageFile,
-                                           "image file (default: the EEPROM of an instrument)");
+void AddViewOptions(CommandSpec command, const std::shared_ptr<ViewOptions>& options) {
+    OptionSpec file =
+        command.Add("FILE", options->memory.imageFile, "image file (default: the EEPROM of an instrument)");
     AddInstrumentOptions(command, options->memory.instrument);
-    file->excludes("--device")->excludes("--transport");
+    file.Excludes("--device").Excludes("--transport");
     AddJsonFlag(command, options->memory.json);
 }
 
@@ -54,7 +55,8 @@ Json JsonOfCopy(const LogCopy& copy) {
 
 Json JsonOfImage(const MemoryTarget& target, ImageModel& model, const LogCopies& copies) {
     Json entries = Json::array();
-    for (const auto& [id, address] : model.Table().GetDatastore()) {
+    const ImageModel::Properties table = model.Table();
+    for (const auto& [id, address] : table.GetDatastore()) {
         entries.push_back({{"id", id}, {"address", address.AsLong()}});
     }
     Json words = Json::object();
@@ -234,28 +236,27 @@ void Diff(Session& session, const DiffOptions& options) {
 
 }  // namespace
 
-void AddEepromViews(CLI::App& group, Session& session) {
+void AddEepromViews(CommandSpec group, Session& session) {
     const auto show = std::make_shared<ViewOptions>();
-    CLI::App* command = group.add_subcommand("show", "show what is in an EEPROM or an image");
-    command->add_flag("--numbers", show->numbers, "show vectors as numbers, not as plots")->group("Output");
+    CommandSpec command = group.AddCommand("show", "show what is in an EEPROM or an image");
+    command.AddFlag("--numbers", show->numbers, "show vectors as numbers, not as plots").Group("Output");
     AddViewOptions(command, show);
     SetAction(command, session, show, Show);
 
     const auto check = std::make_shared<ViewOptions>();
-    command = group.add_subcommand(
+    command = group.AddCommand(
         "check", "check table, logs, checksums and areas, and tell what the driver would use of them");
     AddViewOptions(command, check);
     SetAction(command, session, check, Check);
 
     const auto diff = std::make_shared<DiffOptions>();
-    command = group.add_subcommand("diff",
-                                   "compare two images, or an image and an instrument, by value and "
-                                   "by area; exit code 9 when they differ");
-    command->add_option("A", diff->a, "image file")->required();
-    auto* const other =
-        command->add_option("B", diff->b, "image file (default: the EEPROM of an instrument)");
+    command = group.AddCommand("diff",
+                               "compare two images, or an image and an instrument, by value and "
+                               "by area; exit code 9 when they differ");
+    command.Add("A", diff->a, "image file").Required();
+    OptionSpec other = command.Add("B", diff->b, "image file (default: the EEPROM of an instrument)");
     AddInstrumentOptions(command, diff->memory.instrument);
-    other->excludes("--device")->excludes("--transport");
+    other.Excludes("--device").Excludes("--transport");
     AddJsonFlag(command, diff->memory.json);
     SetAction(command, session, diff, Diff);
 }

@@ -2,8 +2,9 @@
 
 #include <array>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
+#include "Output/Json.h"
 #include "Output/Table.h"
 
 namespace Varnholt::Cli {
@@ -64,12 +65,12 @@ void Identify(Session& session, const Options& options) {
 
 }  // namespace
 
-void AddIdentify(CLI::App& app, Session& session) {
+void AddIdentify(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
-    CLI::App* const command =
-        app.add_subcommand("identify",
-                           "show what an instrument says of itself: chip id, MISC values, mode, "
-                           "CPLD, measurement parameters");
+    CommandSpec command =
+        app.AddCommand("identify",
+                       "show what an instrument says of itself: chip id, MISC values, mode, "
+                       "CPLD, measurement parameters");
     AddInstrumentOptions(command, options->instrument);
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, Identify);

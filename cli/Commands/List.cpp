@@ -1,5 +1,6 @@
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
+#include "Output/Json.h"
 #include "Output/Table.h"
 #include "SystemCommands.h"
 #include "Utilities/Tools/Win32/SystemHelperWin.h"
@@ -37,12 +38,12 @@ void List(Session& session, const Options& options) {
 
 }  // namespace
 
-void AddList(CLI::App& app, Session& session) {
+void AddList(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
-    CLI::App* const command = app.add_subcommand("list", "list the instruments that are connected");
+    CommandSpec command = app.AddCommand("list", "list the instruments that are connected");
     AddTransportOption(command, options->instrument);
-    command->add_flag("--candidates", options->candidates,
-                      "show the USB devices that could be instruments instead, registered or not");
+    command.AddFlag("--candidates", options->candidates,
+                    "show the USB devices that could be instruments instead, registered or not");
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, List);
 }

@@ -1,11 +1,12 @@
 #include <fmt/format.h>
 #include <fmt/ostream.h>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "Memory/ImageEdit.h"
 #include "Memory/ImageModel.h"
 #include "Memory/MemoryTarget.h"
+#include "Output/Json.h"
 #include "Output/ValueList.h"
 
 namespace Varnholt::Cli {
@@ -52,18 +53,17 @@ void Reset(Session& session, const ResetOptions& options) {
 
 }  // namespace
 
-void AddLog(CLI::App& app, Session& session) {
-    CLI::App* const group = app.add_subcommand("log", "show and reset the usage log");
-    group->require_subcommand(1);
+void AddLog(CommandSpec app, Session& session) {
+    CommandSpec group = app.AddGroup("log", "show and reset the usage log");
 
     const auto show = std::make_shared<ShowOptions>();
-    CLI::App* command = group->add_subcommand("show", "show the usage log");
-    command->add_flag("--numbers", show->numbers, "show vectors as numbers, not as plots")->group("Output");
+    CommandSpec command = group.AddCommand("show", "show the usage log");
+    command.AddFlag("--numbers", show->numbers, "show vectors as numbers, not as plots").Group("Output");
     AddMemoryOptions(command, show->memory);
     SetAction(command, session, show, Show);
 
     const auto reset = std::make_shared<ResetOptions>();
-    command = group->add_subcommand("reset", "empty both copies of the usage log");
+    command = group.AddCommand("reset", "empty both copies of the usage log");
     AddChangeOptions(command, reset->change);
     AddMemoryOptions(command, reset->memory);
     SetAction(command, session, reset, Reset);

@@ -3,8 +3,9 @@
 #include <deque>
 #include <utility>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
+#include "Output/Json.h"
 #include "Platform/Time.h"
 #include "Platform/WaitableObjects.h"
 
@@ -71,13 +72,13 @@ void Monitor(Session& session, const Options& options) {
 
 }  // namespace
 
-void AddMonitor(CLI::App& app, Session& session) {
+void AddMonitor(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
-    CLI::App* const command = app.add_subcommand(
+    CommandSpec command = app.AddCommand(
         "monitor", "print a line each time that the button is pressed, and when the instrument is removed");
-    command->add_option("--for", options->seconds, "end after this many seconds (default: with Ctrl-C)")
-        ->type_name("SECONDS")
-        ->check(Silent(CLI::Range(0.0, 1e6)));
+    command.Add("--for", options->seconds, "end after this many seconds (default: with Ctrl-C)")
+        .Type("SECONDS")
+        .Between(0.0, 1e6);
     AddInstrumentOptions(command, options->instrument);
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, Monitor);

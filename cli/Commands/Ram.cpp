@@ -3,10 +3,11 @@
 #include <algorithm>
 #include <array>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "Memory/PropertyText.h"
 #include "Memory/RamAccess.h"
+#include "Output/Json.h"
 #include "Output/Table.h"
 #include "Output/ValueList.h"
 #include "Protocol/PropertyIdentifiers.h"
@@ -124,22 +125,21 @@ void Set(Session& session, const SetOptions& options) {
 
 }  // namespace
 
-void AddRam(CLI::App& app, Session& session) {
-    CLI::App* const group = app.add_subcommand("ram", "show and set volatile parameters of an instrument");
-    group->require_subcommand(1);
+void AddRam(CommandSpec app, Session& session) {
+    CommandSpec group = app.AddGroup("ram", "show and set volatile parameters of an instrument");
 
     const auto show = std::make_shared<ShowOptions>();
-    CLI::App* command = group->add_subcommand("show", "show the volatile parameters");
+    CommandSpec command = group.AddCommand("show", "show the volatile parameters");
     AddInstrumentOptions(command, show->instrument);
     AddJsonFlag(command, show->json);
     SetAction(command, session, show, Show);
 
     const auto set = std::make_shared<SetOptions>();
-    command = group->add_subcommand(
+    command = group.AddCommand(
         "set",
         "set measurement parameters; chooses the measurement mode that can count the integration time");
-    command->add_option("ID=VALUE", set->assignments, "new values, for example 2009=0.05")->required();
-    command->add_flag("--dry-run", set->dryRun, "show what would be set and set nothing")->group("Change");
+    command.Add("ID=VALUE", set->assignments, "new values, for example 2009=0.05").Required();
+    command.AddFlag("--dry-run", set->dryRun, "show what would be set and set nothing").Group("Change");
     AddInstrumentOptions(command, set->instrument);
     AddJsonFlag(command, set->json);
     SetAction(command, session, set, Set);

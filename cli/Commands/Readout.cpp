@@ -8,10 +8,11 @@
 #include <numeric>
 #include <optional>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "Measurement.h"
 #include "Output/AtomicFile.h"
+#include "Output/Json.h"
 #include "Platform/Time.h"
 
 namespace Varnholt::Cli {
@@ -165,27 +166,23 @@ void TakeReadouts(Session& session, const Options& options) {
 
 }  // namespace
 
-void AddReadout(CLI::App& app, Session& session) {
+void AddReadout(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
-    CLI::App* const command = app.add_subcommand("readout", "take readouts of 128 values");
-    command->add_option("-n,--repeat", options->repeat, "readouts to take, 0: until Ctrl-C (default: 1)")
-        ->type_name("N");
-    command->add_option("-i,--interval", options->interval, "seconds from one readout to the next")
-        ->type_name("S")
-        ->check(Silent(CLI::Range(0.0, 86400.0)));
-    const char* const group = "Output (default: a table)";
-    auto* const json = command->add_flag("--json", options->json, "print JSON, one line for each readout");
-    auto* const csv = command->add_flag("--csv", options->csv, "print CSV, one line for each readout");
-    auto* const plot = command->add_flag("--plot", options->plot, "draw the values");
-    auto* const raw =
-        command->add_flag("--raw", options->raw, "the 256 bytes of each readout as the instrument sent them");
-    for (CLI::Option* const form : {json, csv, plot, raw}) {
-        form->group(group);
-    }
-    command->add_flag("--ascii", options->ascii, "draw without Braille characters")->group(group);
-    command->add_option("-o,--output", options->output, "write to a file, which is replaced when complete")
-        ->type_name("FILE")
-        ->group(group);
+    CommandSpec command = app.AddCommand("readout", "take readouts of 128 values");
+    command.Add("-n,--repeat", options->repeat, "readouts to take, 0: until Ctrl-C (default: 1)").Type("N");
+    command.Add("-i,--interval", options->interval, "seconds from one readout to the next")
+        .Type("S")
+        .Between(0.0, 86400.0);
+    const char* const heading = "Output (default: a table)";
+    command.AddFlag("--json", options->json, "print JSON, one line for each readout").Group(heading);
+    command.AddFlag("--csv", options->csv, "print CSV, one line for each readout").Group(heading);
+    command.AddFlag("--plot", options->plot, "draw the values").Group(heading);
+    command.AddFlag("--raw", options->raw, "the 256 bytes of each readout as the instrument sent them")
+        .Group(heading);
+    command.AddFlag("--ascii", options->ascii, "draw without Braille characters").Group(heading);
+    command.Add("-o,--output", options->output, "write to a file, which is replaced when complete")
+        .Type("FILE")
+        .Group(heading);
     AddMeasurementOptions(command, options->measurement);
     AddInstrumentOptions(command, options->instrument);
     SetAction(command, session, options, TakeReadouts);

@@ -8,10 +8,11 @@
 #include <fstream>
 #include <iterator>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "Linux/UdevRule.h"
 #include "Output/AtomicFile.h"
+#include "Output/Json.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -102,17 +103,15 @@ void Register(Session& session, const Options& options) {
 
 }  // namespace
 
-void AddRegister(CLI::App& app, Session& session) {
+void AddRegister(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
-    CLI::App* const command = app.add_subcommand(
+    CommandSpec command = app.AddCommand(
         "register", "make a kind of USB device known as an instrument (writes a udev rule; as root)");
-    command
-        ->add_option("VID:PID", options->id,
-                     "vendor and product number; `ostra list --candidates` shows them")
-        ->required();
-    command->add_flag("--remove", options->remove, "take the registration back");
-    command->add_flag("--dry-run", options->dryRun, "show what would be written");
-    command->add_option("--file", options->file, "the rule file")->capture_default_str();
+    command.Add("VID:PID", options->id, "vendor and product number; `ostra list --candidates` shows them")
+        .Required();
+    command.AddFlag("--remove", options->remove, "take the registration back");
+    command.AddFlag("--dry-run", options->dryRun, "show what would be written");
+    command.Add("--file", options->file, "the rule file");
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, Register);
 }

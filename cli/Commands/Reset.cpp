@@ -1,5 +1,6 @@
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
+#include "Output/Json.h"
 #include "Protocol/Instrument.h"
 
 namespace Varnholt::Cli {
@@ -23,14 +24,13 @@ void Reset(Session& session, const Options& options) {
 
 }  // namespace
 
-void AddReset(CLI::App& app, Session& session) {
+void AddReset(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
-    CLI::App* const command = app.add_subcommand("reset", "reset an instrument");
+    CommandSpec command = app.AddCommand("reset", "reset an instrument");
     command
-        ->add_option("--code", options->code,
-                     "reset code, one byte (default: 31, the one that every opening sends)")
-        ->type_name("N")
-        ->check(Silent(CLI::Range(0, 255)));
+        .Add("--code", options->code, "reset code, one byte (default: 31, the one that every opening sends)")
+        .Type("N")
+        .Between(0, 255);
     AddInstrumentOptions(command, options->instrument);
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, Reset);

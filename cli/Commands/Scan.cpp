@@ -3,11 +3,12 @@
 
 #include <optional>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Measurement.h"
 #include "Output/AtomicFile.h"
+#include "Output/Json.h"
 #include "Platform/Time.h"
 #include "Protocol/Instrument.h"
 
@@ -62,9 +63,10 @@ void RunScan(Session& session, Instrument& instrument, const Options& options, s
         if (session.UserInterruption().IsRequested()) {
             session.Files().Resume();
             instrument.Commands().Reset(Protocol::OpeningResetCode);
-            throw ToolFailure(ExitCode::Interrupted,
-                              fmt::format("scan interrupted after {}; nothing was written",
-                                          SizeText(static_cast<double>(watcher.Received()))));
+            throw ToolFailure(
+                ExitCode::Interrupted,
+                fmt::format("{}: scan interrupted after {}; nothing was written", instrument.Identifier(),
+                            SizeText(static_cast<double>(watcher.Received()))));
         }
         const FailureReport report = Describe(std::current_exception());
         if (report.code == ExitCode::InputOutput && watcher.SilentFor() >= options.timeout * 1000 + Grace &&
@@ -183,26 +185,26 @@ void Scan(Session& session, const Options& options) {
 
 }  // namespace
 
-void AddScan(CLI::App& app, Session& session) {
+void AddScan(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
-    CLI::App* const command = app.add_subcommand(
+    CommandSpec command = app.AddCommand(
         "scan", "stream records: a fixed number of them, or until the instrument stops; Ctrl-C ends it");
-    auto* const total = command->add_option("--total", options->total, "bytes to read")->type_name("BYTES");
-    command->add_option("--records", options->records, "records to read")->type_name("N")->excludes(total);
-    command->add_option("--record-size", options->recordSize, "bytes of a record, 1 to 6553 (default: 256)")
-        ->type_name("BYTES")
-        ->check(Silent(CLI::Range(std::uint32_t{1}, LongestRecord)));
-    command->add_option("--timeout", options->timeout, "seconds that a transfer may take (default: 5)")
-        ->type_name("S")
-        ->check(Silent(CLI::Range(0, 86400)));
+    command.Add("--total", options->total, "bytes to read").Type("BYTES");
+    command.Add("--records", options->records, "records to read").Type("N").Excludes("--total");
+    command.Add("--record-size", options->recordSize, "bytes of a record, 1 to 6553 (default: 256)")
+        .Type("BYTES")
+        .Between(1, LongestRecord);
+    command.Add("--timeout", options->timeout, "seconds that a transfer may take (default: 5)")
+        .Type("S")
+        .Between(0, 86400);
     const char* const group = "Output (default: CSV on standard output, one record a line)";
-    command->add_option("-o,--output", options->output, "write to a file, which is replaced when complete")
-        ->type_name("FILE")
-        ->group(group);
-    command->add_flag("--raw", options->raw, "the bytes as the instrument sent them")->group(group);
-    command->add_flag("--json", options->json, "print a summary as JSON; needs --output")
-        ->needs("--output")
-        ->group(group);
+    command.Add("-o,--output", options->output, "write to a file, which is replaced when complete")
+        .Type("FILE")
+        .Group(group);
+    command.AddFlag("--raw", options->raw, "the bytes as the instrument sent them").Group(group);
+    command.AddFlag("--json", options->json, "print a summary as JSON; needs --output")
+        .Needs("--output")
+        .Group(group);
     AddMeasurementOptions(command, options->measurement);
     AddInstrumentOptions(command, options->instrument);
     SetAction(command, session, options, Scan);

@@ -2,10 +2,11 @@
 
 #include <limits>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "Memory/ImageEdit.h"
 #include "Memory/MemoryTarget.h"
+#include "Output/Json.h"
 #include "Output/Table.h"
 #include "Protocol/PropertyIdentifiers.h"
 
@@ -83,21 +84,18 @@ void Put(Session& session, const PutOptions& options) {
 
 }  // namespace
 
-void AddWord(CLI::App& app, Session& session) {
-    CLI::App* const group =
-        app.add_subcommand("word", "read and write raw words of the EEPROM, 4 bytes each");
-    group->require_subcommand(1);
+void AddWord(CommandSpec app, Session& session) {
+    CommandSpec group = app.AddGroup("word", "read and write raw words of the EEPROM, 4 bytes each");
 
     const auto get = std::make_shared<GetOptions>();
-    CLI::App* command = group->add_subcommand("get", "show raw words");
-    command->add_option("ID", get->ids,
-                        "10200 to 10239 (default: 10200 to 10215; those behind are the table's)");
+    CommandSpec command = group.AddCommand("get", "show raw words");
+    command.Add("ID", get->ids, "10200 to 10239 (default: 10200 to 10215; those behind are the table's)");
     AddMemoryOptions(command, get->memory);
     SetAction(command, session, get, Get);
 
     const auto put = std::make_shared<PutOptions>();
-    command = group->add_subcommand("put", "write raw words");
-    command->add_option("ID=VALUE", put->assignments, "words 10200 to 10215, decimal or 0x...")->required();
+    command = group.AddCommand("put", "write raw words");
+    command.Add("ID=VALUE", put->assignments, "words 10200 to 10215, decimal or 0x...").Required();
     AddChangeOptions(command, put->change);
     AddMemoryOptions(command, put->memory);
     SetAction(command, session, put, Put);

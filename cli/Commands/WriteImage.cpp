@@ -2,9 +2,10 @@
 
 #include <span>
 
-#include "Commands/CommandLine.h"
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "Memory/EepromFile.h"
+#include "Output/Json.h"
 #include "Protocol/Instrument.h"
 
 namespace Varnholt::Cli {
@@ -48,12 +49,12 @@ void WriteImage(Session& session, const Options& options) {
 
 }  // namespace
 
-void AddWriteImage(CLI::App& app, Session& session) {
+void AddWriteImage(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
-    CLI::App* const command = app.add_subcommand("write-image",
-                                                 "write an EEPROM image as it is, unchecked, as the library "
-                                                 "does (`ostra eeprom write` is the safe way)");
-    command->add_option("FILE", options->file, "image of 8192 bytes")->required();
+    CommandSpec command = app.AddCommand("write-image",
+                                         "write an EEPROM image as it is, unchecked, as the library "
+                                         "does (`ostra eeprom write` is the safe way)");
+    command.Add("FILE", options->file, "image of 8192 bytes").Required();
     AddInstrumentOptions(command, options->instrument);
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, WriteImage);

@@ -4,9 +4,10 @@
 
 #include <filesystem>
 
-#include "Commands/CommandLine.h"
+#include "Commands/CommonOptions.h"
 #include "Memory/ImageCheck.h"
 #include "Output/AtomicFile.h"
+#include "Output/Json.h"
 #include "Platform/Time.h"
 
 namespace Varnholt::Cli {
@@ -42,25 +43,25 @@ std::uint32_t CountDifferences(const EepromImage& a, const EepromImage& b) {
 
 }  // namespace
 
-void AddMemoryOptions(CLI::App* command, MemoryOptions& options) {
+void AddMemoryOptions(CommandSpec command, MemoryOptions& options) {
     AddInstrumentOptions(command, options.instrument);
-    command->add_option("--image", options.imageFile, "work on this image file instead of an instrument")
-        ->type_name("FILE")
-        ->excludes("--device")
-        ->excludes("--transport")
-        ->group("Instrument");
+    command.Add("--image", options.imageFile, "work on this image file instead of an instrument")
+        .Type("FILE")
+        .Excludes("--device")
+        .Excludes("--transport")
+        .Group("Instrument");
     AddJsonFlag(command, options.json);
 }
 
-void AddChangeOptions(CLI::App* command, ChangeOptions& options) {
+void AddChangeOptions(CommandSpec command, ChangeOptions& options) {
     const char* const group = "Change";
-    command->add_flag("--dry-run", options.dryRun, "show what would be done and do nothing")->group(group);
+    command.AddFlag("--dry-run", options.dryRun, "show what would be done and do nothing").Group(group);
     command
-        ->add_option("--backup", options.backupFile,
-                     "file for the instrument's earlier content; must not exist (default: a new name)")
-        ->type_name("FILE")
-        ->group(group);
-    command->add_flag("--no-backup", options.noBackup, "make no backup")->excludes("--backup")->group(group);
+        .Add("--backup", options.backupFile,
+             "file for the instrument's earlier content; must not exist (default: a new name)")
+        .Type("FILE")
+        .Group(group);
+    command.AddFlag("--no-backup", options.noBackup, "make no backup").Excludes("--backup").Group(group);
 }
 
 MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, Use use)
@@ -115,7 +116,9 @@ std::string MemoryTarget::TextOf(const Outcome& outcome, const std::string& name
     if (outcome.bytes == 0) {
         return name + " holds this already; nothing to write";
     }
-    const std::string pieces = outcome.pieces > 0 ? fmt::format(" in {} pieces", outcome.pieces) : "";
+    const std::string pieces =
+        outcome.pieces > 0 ? fmt::format(" in {} piece{}", outcome.pieces, outcome.pieces == 1 ? "" : "s")
+                           : "";
     return outcome.dryRun ? fmt::format("{} bytes of {} would be changed{}", outcome.bytes, name, pieces)
                           : fmt::format("{} bytes of {} changed{}{}", outcome.bytes, name, pieces,
                                         outcome.pieces > 0 ? ", read back and compared" : "");

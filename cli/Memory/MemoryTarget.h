@@ -4,11 +4,8 @@
 #include <optional>
 #include <string>
 
+#include "CommandSpec.h"
 #include "Memory/EepromWrite.h"
-
-namespace CLI {
-class App;
-}
 
 namespace Varnholt::Cli {
 
@@ -27,9 +24,9 @@ struct ChangeOptions {
 };
 
 /// --image FILE beside --device, --transport and --json.
-void AddMemoryOptions(CLI::App* command, MemoryOptions& options);
+void AddMemoryOptions(CommandSpec command, MemoryOptions& options);
 /// --dry-run, --backup and --no-backup.
-void AddChangeOptions(CLI::App* command, ChangeOptions& options);
+void AddChangeOptions(CommandSpec command, ChangeOptions& options);
 
 /// The content of an EEPROM, where it came from, and the way back to there.
 class MemoryTarget final {
@@ -56,7 +53,7 @@ class MemoryTarget final {
 
     /// As the user reads it.
     static std::string TextOf(const Outcome& outcome, const std::string& name);
-    Json JsonOf(const Outcome& outcome) const;
+    nlohmann::ordered_json JsonOf(const Outcome& outcome) const;
 
   private:
     std::string MakeBackup(const ChangeOptions& options) const;
