@@ -1,0 +1,121 @@
+#include <gtest/gtest.h>
+
+#include "Platform/Drivers/DriverFixture.h"
+#include "Platform/InterruptibleDeviceFiles.h"
+#include "Support/TestClock.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+namespace Errors = Platform::Errors;
+namespace Status = Protocol::UsbIoDriver::Status;
+using Platform::InterruptibleDeviceFiles;
+using Protocol::BulkInEndpoint;
+using Protocol::BulkOutEndpoint;
+using Protocol::InterruptInEndpoint;
+
+/// The drivers' files with the interruptible ones in front of them.
+class InterruptibleDeviceFilesTest : public DriverFixture {
+  protected:
+    InterruptibleDeviceFilesTest() {
+        for (const std::uint8_t endpoint : {BulkInEndpoint, InterruptInEndpoint}) {
+            device->LeaveToTest(endpoint);
+        }
+        drivers = std::move(files);
+        auto inFront = std::make_unique<InterruptibleDeviceFiles>(*drivers);
+        interruptible = inFront.get();
+        files = std::move(inFront);
+    }
+    ~InterruptibleDeviceFilesTest() override { files.reset(); }
+
+    TestClock clock{TestTime::Virtual};
+    std::unique_ptr<Platform::DeviceFileSystem> drivers;
+    InterruptibleDeviceFiles* interruptible = nullptr;
+};
+
+TEST_F(InterruptibleDeviceFilesTest, EndsReadsOfTheInstrumentsOwnDriver) {
+    const Platform::Handle control = Open("native/port1");
+    const Platform::Handle pipe = OpenPipe(1);
+    Bytes first(64), second(64);
+    Request one, other;
+    StartPending(pipe, first, one);
+    StartPending(pipe, second, other);
+    interruptible->Interrupt();
+    EXPECT_EQ(Result(pipe, one), (Outcome{Errors::OperationAborted, 0}));
+    EXPECT_EQ(Result(pipe, other), (Outcome{Errors::OperationAborted, 0}));
+    EXPECT_EQ(device->Pending(BulkInEndpoint), 0u);
+    EXPECT_TRUE(files->CloseFile(pipe));
+    EXPECT_TRUE(files->CloseFile(control));
+}
+
+TEST_F(InterruptibleDeviceFilesTest, EndsReadsOfTheUsbIoDriver) {
+    const Platform::Handle data = OpenBound(BulkInEndpoint);
+    const Platform::Handle button = OpenBound(InterruptInEndpoint);
+    Bytes first(64), second(8);
+    Request one, other;
+    StartPending(data, first, one);
+    StartPending(button, second, other);
+    interruptible->Interrupt();
+    EXPECT_EQ(Result(data, one), (Outcome{Status::Cancelled, 0}));
+    EXPECT_EQ(Result(button, other), (Outcome{Status::Cancelled, 0}));
+    EXPECT_TRUE(files->CloseFile(data));
+    EXPECT_TRUE(files->CloseFile(button));
+}
+
+TEST_F(InterruptibleDeviceFilesTest, NothingStartsUntilItIsResumed) {
+    const Platform::Handle control = Open("native/port1");
+    const Platform::Handle pipe = OpenPipe(1);
+    interruptible->Interrupt();
+    Bytes buffer(16);
+    Request request;
+    EXPECT_FALSE(StartRead(pipe, buffer, request));
+    EXPECT_EQ(Platform::LastError(), Errors::OperationAborted);
+    const Bytes reset = NativeBlock(0xCA, 0);
+    EXPECT_FALSE(files->StartControl(control, Protocol::NativeDriver::ControlVendorRequest, reset.data(),
+                                     static_cast<std::uint32_t>(reset.size()), nullptr, 0, request.record));
+    EXPECT_EQ(Platform::LastError(), Errors::OperationAborted);
+    interruptible->Resume();
+    StartPending(pipe, buffer, request);
+    device->Send(BulkInEndpoint, Counting(16));
+    EXPECT_EQ(Result(pipe, request), (Outcome{Errors::Success, 16}));
+    EXPECT_EQ(buffer, Counting(16));
+    EXPECT_TRUE(files->CloseFile(pipe));
+    EXPECT_TRUE(files->CloseFile(control));
+}
+
+TEST_F(InterruptibleDeviceFilesTest, FilesAndTransfersThatAreGoneAreLeftAlone) {
+    const Platform::Handle pipe = OpenPipe(1);
+    Bytes buffer(16);
+    {
+        Request request;
+        StartPending(pipe, buffer, request);
+        device->Send(BulkInEndpoint, Counting(16));
+        EXPECT_EQ(Result(pipe, request), (Outcome{Errors::Success, 16}));
+    }
+    interruptible->Interrupt();
+    EXPECT_TRUE(files->CloseFile(pipe));
+    interruptible->Interrupt();
+}
+
+TEST_F(InterruptibleDeviceFilesTest, TellsOfTheDataThatTheThreadReads) {
+    const Platform::Handle control = Open("native/port1");
+    const Platform::Handle pipe = OpenPipe(1);
+    std::vector<std::uint32_t> told;
+    interruptible->ObserveReads([&told](std::uint32_t bytes) { told.push_back(bytes); });
+    for (const std::size_t size : {16u, 7u, 0u}) {
+        Bytes buffer(16);
+        Request request;
+        StartPending(pipe, buffer, request);
+        EXPECT_EQ(Result(pipe, request).code, Errors::IoIncomplete);
+        device->Send(BulkInEndpoint, Counting(size));
+        EXPECT_EQ(Result(pipe, request).bytes, size);
+        EXPECT_EQ(Result(pipe, request).bytes, size) << "asked again";
+    }
+    EXPECT_EQ(told, (std::vector<std::uint32_t>{16, 7})) << "each once, and nothing of nothing";
+    interruptible->ObserveReads({});
+    EXPECT_TRUE(files->CloseFile(pipe));
+    EXPECT_TRUE(files->CloseFile(control));
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests
