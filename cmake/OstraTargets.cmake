@@ -66,6 +66,9 @@ function(ostra_test NAME)
   cmake_parse_arguments(ARG "" "" "SOURCES;LINK" ${ARGN})
   ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest)
   target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
+  if(OSTRA_SANITIZE)
+    target_compile_options(${NAME} PRIVATE -O0)  # what is tested is optimised; its tests had better compile fast
+  endif()
   add_test(NAME ${NAME} COMMAND ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:${NAME}>)
   set_tests_properties(${NAME} PROPERTIES TIMEOUT 300 SKIP_RETURN_CODE 77)
   # The native transport locks an instrument for the whole machine, by its path: tests of it wait for each other.
