@@ -140,7 +140,7 @@ void Property::WriteBytes(std::uint8_t* bytes, bool bigEndian) const try {
             return;
         case TypeFloat:
         case TypeFloatVector:
-            for (const float value : floats) {
+            for (const float& value : floats) {
                 EndianConversion::FloatToByteArray(value, bytes, bigEndian);
                 bytes += ElementSize;
             }

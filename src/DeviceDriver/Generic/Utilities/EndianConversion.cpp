@@ -1,6 +1,6 @@
 #include "DeviceDriver/Generic/Utilities/EndianConversion.h"
 
-#include <bit>
+#include <cstring>
 
 #include "Protocol/ByteOrder.h"
 
@@ -33,8 +33,10 @@ void LongToByteArray(std::int32_t value, std::uint8_t* bytes, bool bigEndian) {
     LongToByteArray(static_cast<std::uint32_t>(value), bytes, bigEndian);
 }
 
-void FloatToByteArray(float value, std::uint8_t* bytes, bool bigEndian) {
-    LongToByteArray(std::bit_cast<std::uint32_t>(value), bytes, bigEndian);
+void FloatToByteArray(const float& value, std::uint8_t* bytes, bool bigEndian) {
+    std::uint32_t bits = 0;
+    std::memcpy(&bits, &value, sizeof bits);
+    LongToByteArray(bits, bytes, bigEndian);
 }
 
 void ByteArrayToShort(const std::uint8_t* bytes, std::uint16_t& value, bool bigEndian) {
@@ -60,7 +62,7 @@ void ByteArrayToLong(const std::uint8_t* bytes, std::int32_t& value, bool bigEnd
 void ByteArrayToFloat(const std::uint8_t* bytes, float& value, bool bigEndian) {
     std::uint32_t bits = 0;
     ByteArrayToLong(bytes, bits, bigEndian);
-    value = std::bit_cast<float>(bits);
+    std::memcpy(&value, &bits, sizeof bits);
 }
 
 }  // namespace Varnholt::DeviceDriver::Generic::Utilities::EndianConversion

@@ -10,7 +10,9 @@ void ShortToByteArray(std::uint16_t value, std::uint8_t* bytes, bool bigEndian);
 void ShortToByteArray(std::int16_t value, std::uint8_t* bytes, bool bigEndian);
 void LongToByteArray(std::uint32_t value, std::uint8_t* bytes, bool bigEndian);
 void LongToByteArray(std::int32_t value, std::uint8_t* bytes, bool bigEndian);
-void FloatToByteArray(float value, std::uint8_t* bytes, bool bigEndian);
+/// By reference: where floats pass through an x87 register on their way, some bit patterns of no number
+/// change.
+void FloatToByteArray(const float& value, std::uint8_t* bytes, bool bigEndian);
 
 void ByteArrayToShort(const std::uint8_t* bytes, std::uint16_t& value, bool bigEndian);
 void ByteArrayToShort(const std::uint8_t* bytes, std::int16_t& value, bool bigEndian);
