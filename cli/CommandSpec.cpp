@@ -57,28 +57,39 @@ CommandSpec CommandSpec::AddGroup(const char* name, const char* about) {
     return CommandSpec(group);
 }
 
+template <class Target>
+OptionSpec CommandSpec::AddOption(const char* names, Target& target, const char* about) {
+    CLI::Option* const option = command->add_option(names, target, about);
+    if (option->get_positional()) {
+        option->type_name("");  // its name says what it is
+    }
+    return OptionSpec(option);
+}
+
 OptionSpec CommandSpec::Add(const char* names, std::string& target, const char* about) {
-    return OptionSpec(command->add_option(names, target, about));
+    return AddOption(names, target, about).Check([](const std::string& text) {
+        return std::string(text.empty() ? "is empty" : "");
+    });
 }
 
 OptionSpec CommandSpec::Add(const char* names, double& target, const char* about) {
-    return OptionSpec(command->add_option(names, target, about));
+    return AddOption(names, target, about);
 }
 
 OptionSpec CommandSpec::Add(const char* names, std::uint16_t& target, const char* about) {
-    return OptionSpec(command->add_option(names, target, about));
+    return AddOption(names, target, about);
 }
 
 OptionSpec CommandSpec::Add(const char* names, std::uint32_t& target, const char* about) {
-    return OptionSpec(command->add_option(names, target, about));
+    return AddOption(names, target, about);
 }
 
 OptionSpec CommandSpec::Add(const char* names, std::vector<std::string>& target, const char* about) {
-    return OptionSpec(command->add_option(names, target, about));
+    return AddOption(names, target, about);
 }
 
 OptionSpec CommandSpec::Add(const char* names, std::vector<std::uint16_t>& target, const char* about) {
-    return OptionSpec(command->add_option(names, target, about));
+    return AddOption(names, target, about);
 }
 
 OptionSpec CommandSpec::AddFlag(const char* names, bool& target, const char* about) {

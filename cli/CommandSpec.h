@@ -36,7 +36,7 @@ class OptionSpec final {
 
 /// A command, or a group of commands, while the command line is being built: the parser behind it is seen by
 /// one source only. Names are as in "-d,--device", or a word for an argument; targets keep their value when
-/// the option is not given.
+/// the option is not given. A text may not be empty: in a script that is a variable that was never set.
 class CommandSpec final {
   public:
     explicit CommandSpec(CLI::App* parserCommand) : command(parserCommand) {}
@@ -59,6 +59,9 @@ class CommandSpec final {
     void WhenChosen(std::function<void()> call);
 
   private:
+    template <class Target>
+    OptionSpec AddOption(const char* names, Target& target, const char* about);
+
     CLI::App* command;
 };
 

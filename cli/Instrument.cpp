@@ -86,9 +86,9 @@ std::size_t FindInstrument(const std::vector<std::string>& identifiers, const st
                       "connected: " + Joined(identifiers));
 }
 
-Instrument::Instrument(Session& session, const InstrumentOptions& options, Choice choice,
+Instrument::Instrument(Session& usedSession, const InstrumentOptions& options, Choice choice,
                        DeviceDriver::Generic::EventListener* listener)
-    : messageListener(listener) {
+    : session(usedSession), messageListener(listener) {
     session.UseTransport(options.transport);
     const std::vector<std::string> connected = ConnectedInstruments();
     const std::size_t index = FindInstrument(connected, options.device);
@@ -109,6 +109,7 @@ Instrument::Instrument(Session& session, const InstrumentOptions& options, Choic
             commands = SmartPointer<CommandSet>(new CommandSet(transport));
         }
     } catch (...) {
+        session.Files().Resume();
         session.UserInterruption().ThrowIfRequested();
         FailureReport report = Describe(std::current_exception());
         if (const std::string holder = HolderOf(identifier);
@@ -126,6 +127,8 @@ Instrument::Instrument(Session& session, const InstrumentOptions& options, Choic
 }
 
 Instrument::~Instrument() {
+    // After an interruption too: closing waits for answers to what it sends.
+    session.Files().Resume();
     try {
         if (messageListener != nullptr) {
             transport->RemoveListener(messageListener);

@@ -40,7 +40,7 @@ class Instrument final {
 
     /// `listener` may be null; it is not owned and outlives the object. Failures name the instrument and,
     /// where it can be seen, who has it.
-    Instrument(Session& session, const InstrumentOptions& options, Choice choice = Choice::FirstWillDo,
+    Instrument(Session& usedSession, const InstrumentOptions& options, Choice choice = Choice::FirstWillDo,
                DeviceDriver::Generic::EventListener* listener = nullptr);
     ~Instrument();
     Instrument(const Instrument&) = delete;
@@ -53,6 +53,7 @@ class Instrument final {
     Transport& Bytes() { return *transport; }
 
   private:
+    Session& session;
     std::string identifier;
     DeviceDriver::Generic::EventListener* const messageListener;
     Utilities::Tools::SmartPointer<Transport> transport;

@@ -48,6 +48,24 @@ std::vector<std::string> Reversed(std::vector<std::string> arguments) {
     return arguments;
 }
 
+/// What is wrong with a command line, and whose help tells more.
+FailureReport ReportOf(const CLI::App& app, const CLI::ParseError& error) {
+    const CLI::App* command = &app;
+    std::string name = app.get_name();
+    for (auto chosen = command->get_subcommands(); !chosen.empty(); chosen = command->get_subcommands()) {
+        command = chosen.front();
+        name += " " + command->get_name();
+    }
+    std::string message = error.what();
+    if (!command->get_subcommands({}).empty()) {
+        // The parser only misses a command where there is one that it does not know.
+        const std::vector<std::string> unknown = command->remaining();
+        message = unknown.empty() ? "a command is missing behind `" + name + "`"
+                                  : "`" + name + "` has no command '" + unknown.front() + "'";
+    }
+    return {ExitCode::Usage, message, "`" + name + " --help` tells more"};
+}
+
 /// What --capture names. Looked for before anything else, because everything else stands on the recorded
 /// files.
 std::string CaptureFileIn(const std::vector<std::string>& arguments) {
@@ -78,8 +96,7 @@ ExitCode Run(const std::vector<std::string>& arguments, Surroundings& surroundin
             app.exit(error, surroundings.out, surroundings.err);
             return ExitCode::Success;
         }
-        session.Report(
-            {ExitCode::Usage, error.what(), "`ostra --help` and `ostra COMMAND --help` tell more"});
+        session.Report(ReportOf(app, error));
         return ExitCode::Usage;
     }
     session.action();

@@ -33,9 +33,9 @@ struct PutOptions {
 };
 
 void Put(Session& session, const PutOptions& options) {
-    const std::vector<std::uint8_t> block = ReadWholeFile(options.file, Protocol::EepromMap::BinarySize);
-    // Before an instrument is opened: the file may be the wrong one.
-    WithBinaryBlock(EepromImage(Protocol::EepromSize), block);
+    const std::vector<std::uint8_t> block =
+        ReadFileOfSize(options.file, Protocol::EepromMap::BinarySize, "a binary block",
+                       "`ostra binary get FILE` saves the one of an instrument");
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     const MemoryTarget::Outcome outcome =
         target.Change(WithBinaryBlock(target.Image(), block), options.change, Granularity::Elements);

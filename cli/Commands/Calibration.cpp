@@ -18,7 +18,7 @@ struct ShowOptions {
 
 void Show(Session& session, const ShowOptions& options) {
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
-    ImageModel model(target.Image());
+    ImageModel model = target.Interpret([](const EepromImage& image) { return ImageModel(image); });
     if (options.memory.json) {
         session.Print({{"source", target.Name()}, {"calibration", JsonOf(model.Calibration())}});
     } else {
@@ -35,7 +35,8 @@ struct SetOptions {
 void Set(Session& session, const SetOptions& options) {
     const std::vector<Assignment> assignments = ParseAssignments(options.assignments);
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
-    const EditedImage edited = WithCalibration(target.Image(), assignments);
+    const EditedImage edited = target.Interpret(
+        [&assignments](const EepromImage& image) { return WithCalibration(image, assignments); });
     const MemoryTarget::Outcome outcome = target.Change(edited.image, options.change, Granularity::Elements);
     if (options.memory.json) {
         Json changes = Json::array();

@@ -37,15 +37,6 @@ void AddViewOptions(CommandSpec command, const std::shared_ptr<ViewOptions>& opt
     AddJsonFlag(command, options->memory.json);
 }
 
-ImageModel ModelOf(const MemoryTarget& target) {
-    try {
-        return ImageModel(target.Image());
-    } catch (const Utilities::Exceptions::RuntimeException& exception) {
-        throw ToolFailure(ExitCode::BadData, target.Name() + ": " + exception.what(),
-                          "`ostra eeprom check` tells what is wrong with it");
-    }
-}
-
 Json JsonOfCopy(const LogCopy& copy) {
     return {{"readable", copy.isReadable},
             {"valid", copy.isValid},
@@ -97,7 +88,7 @@ void PrintRawAreas(Session& session, const EepromImage& image) {
 
 void Show(Session& session, const ViewOptions& options) {
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
-    ImageModel model = ModelOf(target);
+    ImageModel model = target.Interpret([](const EepromImage& image) { return ImageModel(image); });
     const LogCopies copies = ReadLogCopies(target.Image());
     if (options.memory.json) {
         session.Print(JsonOfImage(target, model, copies));
@@ -154,6 +145,13 @@ std::string TextOfSide(const std::optional<Property>& value, bool isWord) {
     return TextOf(*value);
 }
 
+Json JsonOfSide(const std::optional<Property>& value, bool isWord) {
+    if (!value) {
+        return nullptr;
+    }
+    return isWord ? Json(static_cast<std::uint32_t>(value->AsLong())) : JsonOf(*value);
+}
+
 std::string TextOfDifference(const ImageDiff::Value& value) {
     if (value.a && value.b && IsLongVector(*value.a) && IsLongVector(*value.b)) {
         const std::vector<double> a = NumbersOf(*value.a);
@@ -174,13 +172,24 @@ std::string TextOfDifference(const ImageDiff::Value& value) {
     return TextOfSide(value.a, isWord) + " -> " + TextOfSide(value.b, isWord);
 }
 
+/// Which of the two has no values, and why; empty where both have.
+std::string TextOfUnreadable(const ImageDiff& diff, const std::string& a, const std::string& b) {
+    std::string text;
+    for (const auto& [name, reason] : {std::pair(a, diff.unreadableA), std::pair(b, diff.unreadableB)}) {
+        if (!reason.empty()) {
+            text += (text.empty() ? "" : "; ") + name + ": " + reason;
+        }
+    }
+    return text;
+}
+
 void PrintDiff(Session& session, const ImageDiff& diff, const std::string& a, const std::string& b) {
     if (diff.IsEmpty()) {
         fmt::print(session.Out(), "{} and {} are the same\n", a, b);
         return;
     }
-    if (!diff.unreadable.empty()) {
-        session.Warn("calibration and log cannot be compared: " + diff.unreadable);
+    if (const std::string unreadable = TextOfUnreadable(diff, a, b); !unreadable.empty()) {
+        session.Warn("calibration and log cannot be compared: " + unreadable);
     }
     Table values({{"WHAT"}, {"ID", Table::Align::Right}, {"DIFFERENCE"}});
     for (const ImageDiff::Value& value : diff.values) {
@@ -204,13 +213,14 @@ void Diff(Session& session, const DiffOptions& options) {
     other.imageFile = options.b;
     const MemoryTarget b(session, other, MemoryTarget::Use::Read);
     const ImageDiff diff = Compare(a, b.Image());
+    const std::string unreadable = TextOfUnreadable(diff, options.a, b.Name());
     if (options.memory.json) {
         Json values = Json::array();
         for (const ImageDiff::Value& value : diff.values) {
             values.push_back({{"kind", value.kind},
                               {"id", value.id},
-                              {"a", value.a ? JsonOf(*value.a) : Json(nullptr)},
-                              {"b", value.b ? JsonOf(*value.b) : Json(nullptr)}});
+                              {"a", JsonOfSide(value.a, value.kind == "word")},
+                              {"b", JsonOfSide(value.b, value.kind == "word")}});
         }
         Json areas = Json::array();
         for (const ImageDiff::Area& area : diff.areas) {
@@ -223,7 +233,7 @@ void Diff(Session& session, const DiffOptions& options) {
         session.Print({{"a", options.a},
                        {"b", b.Name()},
                        {"same", diff.IsEmpty()},
-                       {"unreadable", diff.unreadable.empty() ? Json(nullptr) : Json(diff.unreadable)},
+                       {"unreadable", unreadable.empty() ? Json(nullptr) : Json(unreadable)},
                        {"values", values},
                        {"areas", areas}});
     } else {

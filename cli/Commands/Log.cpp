@@ -19,7 +19,7 @@ struct ShowOptions {
 
 void Show(Session& session, const ShowOptions& options) {
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
-    ImageModel model(target.Image());
+    ImageModel model = target.Interpret([](const EepromImage& image) { return ImageModel(image); });
     const LogCopies copies = ReadLogCopies(target.Image());
     if (options.memory.json) {
         session.Print({{"source", target.Name()},
@@ -42,7 +42,7 @@ struct ResetOptions {
 
 void Reset(Session& session, const ResetOptions& options) {
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
-    const EepromImage empty = WithEmptyLog(target.Image());
+    const EepromImage empty = target.Interpret(WithEmptyLog);
     const MemoryTarget::Outcome outcome = target.Change(empty, options.change, Granularity::Elements);
     if (options.memory.json) {
         session.Print(target.JsonOf(outcome));

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <limits>
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
@@ -78,6 +79,26 @@ struct SetOptions {
     bool json = false;
 };
 
+/// Refuses what the instrument would take for something else: it knows no signs, and counts in 16 bits.
+void CheckSign(const Assignment& assignment, const Property& value) {
+    const bool isTime = assignment.id == Ids::IntegrationTime || assignment.id == Ids::SecondTime;
+    if (isTime ? value.AsFloat() < 0 : value.AsLong() < 0) {
+        throw ToolFailure(ExitCode::BadData, fmt::format("{}={}: the instrument knows no negative numbers",
+                                                         assignment.id, assignment.value));
+    }
+}
+
+void CheckReplacement(const RamAccess::Properties& set) {
+    const std::int32_t replacement = set.GetProperty(Ids::ThirdParameterReplacement).AsLong();
+    if (replacement > std::numeric_limits<std::uint16_t>::max()) {
+        throw ToolFailure(ExitCode::BadData, fmt::format("9189={}: at most 65535 can be sent", replacement));
+    }
+    if (replacement > 0 && set.GetProperty(Ids::FlagBit0).AsLong() == 0) {
+        throw ToolFailure(ExitCode::Usage, "9189 takes the place of 2010 only together with 2008=1",
+                          fmt::format("ostra ram set 9189={} 2008=1", replacement));
+    }
+}
+
 RamAccess::Properties Changed(const RamAccess::Properties& loaded,
                               const std::vector<Assignment>& assignments) {
     auto set = loaded;
@@ -87,9 +108,34 @@ RamAccess::Properties Changed(const RamAccess::Properties& loaded,
             throw ToolFailure(ExitCode::Usage, fmt::format("{} cannot be set", assignment.id),
                               "2000, 2001, 2002, 2003, 2008, 2009, 2010 and 9189 can");
         }
-        set.SetProperty(assignment.id, ParseValue(assignment, set.GetProperty(assignment.id)));
+        const Property value = ParseValue(assignment, set.GetProperty(assignment.id));
+        CheckSign(assignment, value);
+        set.SetProperty(assignment.id, value);
     }
+    CheckReplacement(set);
     return set;
+}
+
+/// What to show of a change: what was asked for, then what has changed with it, as a mode rounds all times
+/// anew.
+std::vector<std::uint16_t> IdsToShow(const std::vector<Assignment>& assignments,
+                                     const RamAccess::Properties& before,
+                                     const RamAccess::Properties& after) {
+    std::vector<std::uint16_t> ids;
+    const auto add = [&ids](std::uint16_t id) {
+        if (std::ranges::find(ids, id) == ids.end()) {
+            ids.push_back(id);
+        }
+    };
+    for (const Assignment& assignment : assignments) {
+        add(assignment.id);
+    }
+    for (const Meaning& meaning : Meanings) {
+        if (TextOf(before.GetProperty(meaning.id)) != TextOf(after.GetProperty(meaning.id))) {
+            add(meaning.id);
+        }
+    }
+    return ids;
 }
 
 void Set(Session& session, const SetOptions& options) {
@@ -99,18 +145,19 @@ void Set(Session& session, const SetOptions& options) {
     const auto before = ram.Load();
     auto set = Changed(before, assignments);
     if (!options.dryRun) {
+        const Property replacement = set.GetProperty(Ids::ThirdParameterReplacement);
         ram.Store(set);
         // What the instrument made of it: times are rounded to what its mode can count.
         set = ram.Load();
+        set.SetProperty(Ids::ThirdParameterReplacement, replacement);  // which cannot be loaded
     }
     Json changes = Json::array();
     Table table({{"ID", Table::Align::Right}, {"BEFORE"}, {}, {"AFTER"}, {"MEANING"}});
-    for (const Assignment& assignment : assignments) {
-        const Property& old = before.GetProperty(assignment.id);
-        const Property& now = set.GetProperty(assignment.id);
-        changes.push_back({{"id", assignment.id}, {"before", JsonOf(old)}, {"after", JsonOf(now)}});
-        table.AddRow(
-            {std::to_string(assignment.id), TextOf(old), "->", TextOf(now), MeaningOf(assignment.id)->text});
+    for (const std::uint16_t id : IdsToShow(assignments, before, set)) {
+        const Property& old = before.GetProperty(id);
+        const Property& now = set.GetProperty(id);
+        changes.push_back({{"id", id}, {"before", JsonOf(old)}, {"after", JsonOf(now)}});
+        table.AddRow({std::to_string(id), TextOf(old), "->", TextOf(now), MeaningOf(id)->text});
     }
     if (options.json) {
         session.Print(
@@ -119,7 +166,9 @@ void Set(Session& session, const SetOptions& options) {
     }
     table.Print(session.Out());
     if (options.dryRun) {
-        session.Out() << "nothing was set (the instrument rounds times to what its mode can count)\n";
+        session.Out()
+            << "nothing was set; which measurement mode can count the times, and how it rounds them, "
+               "shows when they are set\n";
     }
 }
 

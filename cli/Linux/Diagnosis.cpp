@@ -5,11 +5,7 @@
 
 #include <algorithm>
 
-#include "Failure.h"
 #include "Instrument.h"
-#include "Platform/Usb/DeviceHolders.h"
-#include "Platform/Usb/SimulatorBus.h"
-#include "Platform/Usb/UdevBus.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -17,62 +13,60 @@ namespace {
 using Level = Finding::Level;
 using Platform::Usb::UsbDeviceInfo;
 
+constexpr const char* Replug = "unplug it and plug it in again";
+constexpr const char* EndTheOther = "end that program, or wait until it is done";
+/// The kernel's name for programs that drive a device themselves.
+constexpr const char* ProgramAsDriver = "usbfs";
+
 std::string NameOf(const UsbDeviceInfo& device) {
     const std::string product = device.product.empty() ? "" : ", " + device.product;
     return fmt::format("{} ({}:{}{})", device.name, device.vendorId, device.productId, product);
 }
 
-/// Opens the instrument and asks it something.
-Finding Try(Session& session, const std::string& subject, const std::string& shortName) {
-    const std::vector<std::string> connected = ConnectedInstruments();
-    const auto listed = std::ranges::find(connected, shortName, &ShortNameOf);
-    if (listed == connected.end()) {
-        return {Level::Problem, subject, "is not listed by the library", "unplug it and plug it in again",
-                ExitCode::NoInstrument};
+Finding JudgeAnswer(const std::string& subject, const Answer& answer) {
+    if (!answer.failure) {
+        return {Level::Good, subject, fmt::format("answers (firmware {})", answer.firmware), ""};
     }
-    try {
-        Instrument instrument(session, {*listed, ""});
-        std::uint8_t m1 = 0, m3 = 0;
-        std::uint16_t m2 = 0, m4 = 0, m5 = 0;
-        instrument.Commands().GetMISC(m1, m2, m3, m4, m5);
-        return {Level::Good, subject, fmt::format("answers (firmware {})", m2), ""};
-    } catch (...) {
-        const FailureReport report = session.Explain(std::current_exception());
-        return {Level::Problem, subject, "does not answer: " + report.message,
-                report.advice.empty()
-                    ? "unplug it and plug it in again; if that does not help, its firmware does not run"
-                    : report.advice,
-                report.code};
-    }
+    const FailureReport& failure = *answer.failure;
+    return {Level::Problem, subject, "does not answer: " + failure.message,
+            failure.advice.empty()
+                ? std::string(Replug) + "; if that does not help, its firmware does not run"
+                : failure.advice,
+            failure.code};
 }
 
-void LookAtDevice(Session& session, const UsbDeviceInfo& device, std::vector<Finding>& findings) {
+void JudgeDevice(const DeviceFacts& facts, const Trial& trial, std::vector<Finding>& findings) {
+    const UsbDeviceInfo& device = facts.info;
     const std::string subject = NameOf(device);
-    if (!device.registered) {
-        findings.push_back({Level::Problem, subject, "has the instrument's endpoints but is not registered",
-                            fmt::format("sudo ostra register {}:{}", device.vendorId, device.productId),
-                            ExitCode::NoInstrument});
+    const std::string id = device.vendorId + ":" + device.productId;
+    if (!facts.hasEndpoints) {
+        findings.push_back({Level::Problem, subject,
+                            "is registered but does not have the instrument's endpoints",
+                            "sudo ostra register --remove " + id, ExitCode::NoInstrument});
         return;
     }
-    if (access(device.deviceNode.c_str(), R_OK | W_OK) != 0) {
+    if (!device.registered) {
+        findings.push_back({Level::Problem, subject, "has the instrument's endpoints but is not registered",
+                            "sudo ostra register " + id, ExitCode::NoInstrument});
+        return;
+    }
+    if (!facts.isAccessible) {
         findings.push_back(
-            {Level::Problem, subject, fmt::format("no permission on {}", device.deviceNode),
-             fmt::format(
-                 "log in at this machine's own seat, or run as root; `sudo ostra register {}:{}` writes the "
-                 "rule anew, then unplug it and plug it in again",
-                 device.vendorId, device.productId),
+            {Level::Problem, subject, "no permission on " + device.deviceNode,
+             fmt::format("log in at this machine's own seat, or run as root; `sudo ostra register {}` writes "
+                         "the rule anew, then {}",
+                         id, Replug),
              ExitCode::NotAvailable});
         return;
     }
-    const auto holders = Platform::Usb::FindHolders(device.deviceNode);
-    if (!holders.empty()) {
-        findings.push_back(
-            {Level::Problem, subject,
-             fmt::format("is in use by {} (process {})", holders.front().name, holders.front().processId),
-             "end that program, or wait until it is done", ExitCode::NotAvailable});
+    if (!facts.holders.empty()) {
+        findings.push_back({Level::Problem, subject,
+                            fmt::format("is in use by {} (process {})", facts.holders.front().name,
+                                        facts.holders.front().processId),
+                            EndTheOther, ExitCode::NotAvailable});
         return;
     }
-    if (!device.kernelDriver.empty() && device.kernelDriver != "usbfs") {
+    if (!device.kernelDriver.empty() && device.kernelDriver != ProgramAsDriver) {
         findings.push_back(
             {Level::Note, subject,
              fmt::format(
@@ -80,45 +74,66 @@ void LookAtDevice(Session& session, const UsbDeviceInfo& device, std::vector<Fin
                  device.kernelDriver),
              ""});
     }
-    findings.push_back(Try(session, subject, device.name));
+    findings.push_back(JudgeAnswer(subject, trial(device.name)));
 }
 
-void LookAtSimulator(Session& session, const Platform::Usb::SimulatorInfo& simulator,
-                     std::vector<Finding>& findings) {
+Finding JudgeSimulator(const Platform::Usb::SimulatorInfo& simulator, const Trial& trial) {
     if (!simulator.usable) {
-        findings.push_back({Level::Note, simulator.name,
-                            fmt::format("is run by another user (user {}, process {}) and cannot be used",
-                                        simulator.userId, simulator.processId),
-                            "start an ostra-simulator of your own"});
-    } else if (!simulator.usedBy.empty()) {
-        findings.push_back({Level::Problem, simulator.name, "is in use by " + simulator.usedBy,
-                            "end that program, or wait until it is done", ExitCode::NotAvailable});
-    } else {
-        findings.push_back(Try(session, simulator.name, simulator.name));
+        return {Level::Note, simulator.name,
+                fmt::format("is run by another user (user {}, process {}) and cannot be used",
+                            simulator.userId, simulator.processId),
+                "start an ostra-simulator of your own"};
+    }
+    if (!simulator.usedBy.empty()) {
+        return {Level::Problem, simulator.name, "is in use by " + simulator.usedBy, EndTheOther,
+                ExitCode::NotAvailable};
+    }
+    return JudgeAnswer(simulator.name, trial(simulator.name));
+}
+
+MachineFacts LookAround() {
+    MachineFacts facts;
+    for (const UsbDeviceInfo& device : Platform::Usb::ListCandidateDevices()) {
+        facts.devices.push_back({device, true, access(device.deviceNode.c_str(), R_OK | W_OK) == 0,
+                                 Platform::Usb::FindHolders(device.deviceNode)});
+    }
+    for (const UsbDeviceInfo& device : Platform::Usb::ListRegisteredDevices()) {
+        const bool isCandidate = std::ranges::any_of(
+            facts.devices, [&](const DeviceFacts& known) { return known.info.name == device.name; });
+        if (!isCandidate) {
+            facts.devices.push_back({device, false, true, {}});
+        }
+    }
+    facts.simulators = Platform::Usb::ListSimulators();
+    return facts;
+}
+
+Answer Try(Session& session, const std::string& shortName) {
+    const std::vector<std::string> connected = ConnectedInstruments();
+    const auto listed = std::ranges::find(connected, shortName, &ShortNameOf);
+    if (listed == connected.end()) {
+        return {0, FailureReport{ExitCode::NoInstrument, "the library does not list it", Replug}};
+    }
+    try {
+        Instrument instrument(session, {*listed, ""});
+        std::uint8_t m1 = 0, m3 = 0;
+        std::uint16_t m2 = 0, m4 = 0, m5 = 0;
+        instrument.Commands().GetMISC(m1, m2, m3, m4, m5);
+        return {m2, std::nullopt};
+    } catch (...) {
+        return {0, session.Explain(std::current_exception())};
     }
 }
 
 }  // namespace
 
-std::vector<Finding> Diagnose(Session& session) {
+std::vector<Finding> Judge(const MachineFacts& facts, const Trial& trial) {
     std::vector<Finding> findings;
-    std::vector<UsbDeviceInfo> devices = Platform::Usb::ListCandidateDevices();
-    for (const UsbDeviceInfo& registered : Platform::Usb::ListRegisteredDevices()) {
-        const bool known =
-            std::ranges::any_of(devices, [&](const UsbDeviceInfo& d) { return d.name == registered.name; });
-        if (!known) {
-            findings.push_back(
-                {Level::Problem, NameOf(registered),
-                 "is registered but does not have the instrument's endpoints",
-                 fmt::format("sudo ostra register --remove {}:{}", registered.vendorId, registered.productId),
-                 ExitCode::NoInstrument});
-        }
+    for (const DeviceFacts& device : facts.devices) {
+        JudgeDevice(device, trial, findings);
     }
-    for (const UsbDeviceInfo& device : devices) {
-        LookAtDevice(session, device, findings);
-    }
-    for (const auto& simulator : Platform::Usb::ListSimulators()) {
-        LookAtSimulator(session, simulator, findings);
+    for (const auto& simulator : facts.simulators) {
+        findings.push_back(JudgeSimulator(simulator, trial));
     }
     if (std::ranges::none_of(findings, [](const Finding& finding) { return finding.level != Level::Note; })) {
         findings.push_back(
@@ -128,6 +143,10 @@ std::vector<Finding> Diagnose(Session& session) {
              ExitCode::NoInstrument});
     }
     return findings;
+}
+
+std::vector<Finding> Diagnose(Session& session) {
+    return Judge(LookAround(), [&session](const std::string& name) { return Try(session, name); });
 }
 
 }  // namespace Varnholt::Cli

@@ -10,7 +10,10 @@
 
 namespace Varnholt::Cli {
 
-std::vector<std::uint8_t> ReadWholeFile(const std::string& name, std::size_t limit) {
+namespace {
+
+/// At most one byte more than `limit`: that many are too many.
+std::vector<std::uint8_t> ReadFileUpTo(const std::string& name, std::size_t limit) {
     const auto fail = [&name](const std::string& why) {
         throw ToolFailure(ExitCode::File, "cannot read " + name + ": " + why);
     };
@@ -32,20 +35,24 @@ std::vector<std::uint8_t> ReadWholeFile(const std::string& name, std::size_t lim
     return content;
 }
 
-EepromImage ReadImageFile(const std::string& name) {
-    EepromImage image = ReadWholeFile(name, Protocol::EepromSize);
-    if (image.size() != Protocol::EepromSize) {
-        const std::string size = image.size() > Protocol::EepromSize
-                                     ? "more than " + std::to_string(Protocol::EepromSize)
-                                     : std::to_string(image.size());
-        throw ToolFailure(
-            ExitCode::BadData,
-            name + " is no EEPROM image: it has " + size + " bytes instead of " +
-                std::to_string(Protocol::EepromSize),
-            "`ostra eeprom backup FILE` makes one from an instrument, `ostra eeprom new FILE` a "
-            "fresh one");
+}  // namespace
+
+std::vector<std::uint8_t> ReadFileOfSize(const std::string& name, std::size_t size, const std::string& what,
+                                         const std::string& advice) {
+    std::vector<std::uint8_t> content = ReadFileUpTo(name, size);
+    if (content.size() != size) {
+        const std::string found =
+            content.size() > size ? "more than " + std::to_string(size) + " bytes"
+                                  : std::to_string(content.size()) + " bytes, not " + std::to_string(size);
+        throw ToolFailure(ExitCode::BadData, name + " is not " + what + ": it has " + found, advice);
     }
-    return image;
+    return content;
+}
+
+EepromImage ReadImageFile(const std::string& name) {
+    return ReadFileOfSize(
+        name, Protocol::EepromSize, "an EEPROM image",
+        "`ostra eeprom backup FILE` makes one from an instrument, `ostra eeprom new FILE` a fresh one");
 }
 
 }  // namespace Varnholt::Cli

@@ -9,11 +9,13 @@ namespace Varnholt::Cli {
 /// The content of an EEPROM, 8192 bytes.
 using EepromImage = std::vector<std::uint8_t>;
 
-/// Throws `ToolFailure`: `ExitCode::File` when it cannot be read, `ExitCode::BadData` when it is not an image
-/// by its size.
-EepromImage ReadImageFile(const std::string& name);
+/// The file's content when it has exactly `size` bytes; `what` a file of that size is, with its article, is
+/// for the message. Throws `ToolFailure`: `ExitCode::File` when it cannot be read, `ExitCode::BadData` when
+/// it has another size.
+std::vector<std::uint8_t> ReadFileOfSize(const std::string& name, std::size_t size, const std::string& what,
+                                         const std::string& advice = {});
 
-/// Any file of at most `limit` bytes.
-std::vector<std::uint8_t> ReadWholeFile(const std::string& name, std::size_t limit);
+/// An image, as far as its size tells.
+EepromImage ReadImageFile(const std::string& name);
 
 }  // namespace Varnholt::Cli

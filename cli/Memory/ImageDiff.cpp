@@ -1,6 +1,7 @@
 #include "Memory/ImageDiff.h"
 
 #include <array>
+#include <memory>
 
 #include "Memory/ImageEdit.h"
 #include "Memory/ImageModel.h"
@@ -57,15 +58,22 @@ void CompareWords(ImageDiff& diff, const EepromImage& a, const EepromImage& b) {
     }
 }
 
-void CompareValues(ImageDiff& diff, const EepromImage& a, const EepromImage& b) {
+std::unique_ptr<ImageModel> ModelOf(const EepromImage& image, std::string& whyNot) {
     try {
-        ImageModel left(a);
-        ImageModel right(b);
-        CompareSets(diff, "calibration", left.Calibration(), right.Calibration());
-        CompareSets(diff, "log", left.Log(), right.Log());
-        CompareSets(diff, "table", left.Table(), right.Table());
+        return std::make_unique<ImageModel>(image);
     } catch (const Utilities::Exceptions::RuntimeException& exception) {
-        diff.unreadable = exception.what();
+        whyNot = exception.what();
+        return nullptr;
+    }
+}
+
+void CompareValues(ImageDiff& diff, const EepromImage& a, const EepromImage& b) {
+    const auto left = ModelOf(a, diff.unreadableA);
+    const auto right = ModelOf(b, diff.unreadableB);
+    if (left && right) {
+        CompareSets(diff, "calibration", left->Calibration(), right->Calibration());
+        CompareSets(diff, "log", left->Log(), right->Log());
+        CompareSets(diff, "table", left->Table(), right->Table());
     }
     CompareWords(diff, a, b);
 }

@@ -25,8 +25,8 @@ struct ImageDiff {
 
     std::vector<Value> values;
     std::vector<Area> areas;
-    /// Why the values of an image could not be compared; empty where they were.
-    std::string unreadable;
+    /// Why the values of an image cannot be read; with one of them there is nothing to compare.
+    std::string unreadableA, unreadableB;
 
     bool IsEmpty() const { return areas.empty(); }
 };

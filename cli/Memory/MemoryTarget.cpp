@@ -33,6 +33,16 @@ std::string NewBackupName(const std::string& identifier) {
     }
 }
 
+/// A file's name as the command line takes it.
+std::string Quoted(const std::string& fileName) {
+    const bool isPlain = fileName.find_first_of(" \t'\"\\$`&;|<>()*?!#~[]{}") == std::string::npos;
+    return isPlain ? fileName : fmt::format("\"{}\"", fileName);
+}
+
+std::string CountOf(std::size_t count, const char* what) {
+    return fmt::format("{} {}{}", count, what, count == 1 ? "" : "s");
+}
+
 std::uint32_t CountDifferences(const EepromImage& a, const EepromImage& b) {
     std::uint32_t count = 0;
     for (std::size_t i = 0; i < a.size(); ++i) {
@@ -78,6 +88,12 @@ MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, U
     image = use == Use::Change ? ReadEepromTwice(session, *instrument) : ReadEeprom(session, *instrument);
 }
 
+ToolFailure MemoryTarget::Unusable(const std::string& reason) const {
+    const std::string which = instrument ? "--device " + ShortNameOf(name) : Quoted(file);
+    return {ExitCode::BadData, name + ": the driver cannot use what is in it: " + reason,
+            "`ostra eeprom check " + which + "` tells what is wrong with it"};
+}
+
 std::string MemoryTarget::MakeBackup(const ChangeOptions& options) const {
     if (options.noBackup) {
         return {};
@@ -90,10 +106,10 @@ std::string MemoryTarget::MakeBackup(const ChangeOptions& options) const {
 
 std::string MemoryTarget::WayBack(const std::string& backup) const {
     if (backup.empty()) {
-        return "there is no backup: write an image with `ostra eeprom write FILE`";
+        return "the same command once more writes what is missing; there is no backup";
     }
     return fmt::format("this brings back what was there before: ostra eeprom restore {} --device {}{}",
-                       backup, ShortNameOf(name), IsSane(CheckImage(image)) ? "" : " --force");
+                       Quoted(backup), ShortNameOf(name), IsSane(CheckImage(image)) ? "" : " --force");
 }
 
 MemoryTarget::Outcome MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& options,
@@ -116,11 +132,10 @@ std::string MemoryTarget::TextOf(const Outcome& outcome, const std::string& name
     if (outcome.bytes == 0) {
         return name + " holds this already; nothing to write";
     }
-    const std::string pieces =
-        outcome.pieces > 0 ? fmt::format(" in {} piece{}", outcome.pieces, outcome.pieces == 1 ? "" : "s")
-                           : "";
-    return outcome.dryRun ? fmt::format("{} bytes of {} would be changed{}", outcome.bytes, name, pieces)
-                          : fmt::format("{} bytes of {} changed{}{}", outcome.bytes, name, pieces,
+    const std::string bytes = CountOf(outcome.bytes, "byte");
+    const std::string pieces = outcome.pieces > 0 ? " in " + CountOf(outcome.pieces, "piece") : "";
+    return outcome.dryRun ? fmt::format("{} of {} would be changed{}", bytes, name, pieces)
+                          : fmt::format("{} of {} changed{}{}", bytes, name, pieces,
                                         outcome.pieces > 0 ? ", read back and compared" : "");
 }
 

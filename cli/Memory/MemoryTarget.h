@@ -6,6 +6,7 @@
 
 #include "CommandSpec.h"
 #include "Memory/EepromWrite.h"
+#include "Utilities/Exceptions/Exceptions.h"
 
 namespace Varnholt::Cli {
 
@@ -40,6 +41,17 @@ class MemoryTarget final {
     const std::string& Name() const { return name; }
     const EepromImage& Image() const { return image; }
 
+    /// What `read` makes of the image's values. The memory model's refusal of an image is a `ToolFailure`
+    /// that names the image and how to look into it.
+    template <class Read>
+    auto Interpret(Read read) const {
+        try {
+            return read(image);
+        } catch (const Utilities::Exceptions::RuntimeException& exception) {
+            throw Unusable(exception.what());
+        }
+    }
+
     /// What a change did, or with a dry run would have done.
     struct Outcome {
         bool dryRun = false;
@@ -56,6 +68,7 @@ class MemoryTarget final {
     nlohmann::ordered_json JsonOf(const Outcome& outcome) const;
 
   private:
+    ToolFailure Unusable(const std::string& reason) const;
     std::string MakeBackup(const ChangeOptions& options) const;
     std::string WayBack(const std::string& backup) const;
 

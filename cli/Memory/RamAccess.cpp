@@ -2,7 +2,8 @@
 
 #include <fmt/format.h>
 
-#include <string_view>
+#include <array>
+#include <utility>
 
 #include "DeviceDriver/Ostra/LowLevel/PellandoRAM.h"
 #include "Protocol/PropertyIdentifiers.h"
@@ -17,6 +18,7 @@ namespace Ids = Protocol::PropertyIds;
 
 constexpr double Microsecond = 1e-6;
 constexpr std::uint32_t LongestCount = 65535;
+constexpr double HalfACount = 0.5;
 
 struct Mode {
     std::uint8_t count = 0;   ///< modes that the instrument has
@@ -27,6 +29,10 @@ struct Mode {
     std::uint8_t flags = 0;
 };
 
+/// What an instrument without modes counts with.
+constexpr Mode OnlyMode{
+    .count = 1, .number = 1, .m3 = 0, .coarseFactor = 130, .tickMicroseconds = 68, .flags = 0};
+
 Mode CurrentMode(Instrument& instrument) {
     Mode mode;
     instrument.Commands().GetMeasureMode(mode.count, mode.number, mode.m3, mode.coarseFactor,
@@ -36,6 +42,22 @@ Mode CurrentMode(Instrument& instrument) {
 
 bool HasModes(const Properties& set) {
     return set.GetProperty(Ids::Misc2).AsLong() >= Ids::FirstMisc2WithModes;
+}
+
+/// A count that is too large for its 16 bits would be cut off, and another time be set without a word.
+void CheckTimes(const Properties& set, const Mode& mode) {
+    const double tick = mode.tickMicroseconds * Microsecond;
+    const std::array times{std::pair{Ids::IntegrationTime, tick},
+                           std::pair{Ids::SecondTime, tick * mode.coarseFactor}};
+    for (const auto& [id, unit] : times) {
+        const float wanted = set.GetProperty(id).AsFloat();
+        if (wanted / unit >= LongestCount + HalfACount) {
+            throw ToolFailure(
+                ExitCode::BadData, fmt::format("{}={}: the instrument cannot count that far", id, wanted),
+                fmt::format("the longest is {:.6g} s{}", LongestCount * unit,
+                            id == Ids::SecondTime ? ", in the measurement mode that 2009 asks for" : ""));
+        }
+    }
 }
 
 }  // namespace
@@ -58,21 +80,25 @@ Properties RamAccess::Load() {
 
 void RamAccess::Store(Properties& set) {
     const bool hasModes = HasModes(set);
-    const std::uint8_t modeBefore = hasModes ? CurrentMode(instrument).number : std::uint8_t{0};
+    const Mode before = hasModes ? CurrentMode(instrument) : OnlyMode;
+    PellandoRAM ram(instrument.SharedCommands());
     try {
-        PellandoRAM(instrument.SharedCommands()).Store(set);
+        ram.SwitchToPerfectMode(set);
+        CheckTimes(set, hasModes ? CurrentMode(instrument) : OnlyMode);
     } catch (const Utilities::Exceptions::ResourceException& exception) {
-        const std::string_view text = exception.what();
-        if (!hasModes || !text.starts_with("Integration time too")) {
-            throw;
-        }
         const std::string modes = DescribeModes();
-        instrument.Commands().SetMeasureMode(modeBefore);
+        instrument.Commands().SetMeasureMode(before.number);
         throw ToolFailure(ExitCode::BadData,
-                          fmt::format("{}: {} s fits none of the instrument's modes", text,
+                          fmt::format("{}: {} s fits none of the instrument's modes", exception.what(),
                                       set.GetProperty(Ids::IntegrationTime).AsFloat()),
                           modes);
+    } catch (const ToolFailure&) {
+        if (hasModes) {
+            instrument.Commands().SetMeasureMode(before.number);
+        }
+        throw;
     }
+    ram.Store(set);
 }
 
 /// Goes through the modes as the model does; a mode that does not come when it is called ends the list.

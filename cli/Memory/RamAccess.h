@@ -17,7 +17,8 @@ class RamAccess final {
     /// All identifiers of the model's set.
     Properties Load();
     /// Stores the measurement parameters of a set that `Load` made. An integration time that no mode of the
-    /// instrument can count is a `ToolFailure` that lists the modes; the instrument is then back in its mode.
+    /// instrument can count is a `ToolFailure` that lists the modes, and a second time that the mode cannot
+    /// count another; the instrument is then back in its mode, with its parameters as they were.
     void Store(Properties& set);
 
   private:

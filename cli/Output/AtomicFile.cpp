@@ -77,6 +77,8 @@ void AtomicFile::Commit() {
         if (error) {
             Fail(error.message());
         }
+        // So that the name is on the disk as well; a system that cannot do that to a folder does without.
+        SyncToDisk(target.has_parent_path() ? target.parent_path().string() : ".");
     }
     committed = true;
 }

@@ -201,7 +201,7 @@ TEST_P(InstrumentCommandsTest, WriteImageWritesTheBytesAsTheyAre) {
     for (const std::size_t size : {0u, 8191u, 8193u}) {
         WriteFile(folder.Path("wrong"), std::vector<std::uint8_t>(size));
         EXPECT_EQ(tool.Run({"write-image", folder.Path("wrong")}), ExitCode::BadData) << size;
-        EXPECT_NE(tool.Err().find("instead of 8192"), std::string::npos) << tool.Err();
+        EXPECT_NE(tool.Err().find("is not an EEPROM image"), std::string::npos) << tool.Err();
     }
     EXPECT_EQ(tool.Run({"write-image", folder.Path("missing")}), ExitCode::File);
     EXPECT_EQ(instrument.Eeprom(), image);
@@ -270,6 +270,9 @@ TEST(CommandLineTest, UsageErrorsGoToStandardError) {
     for (const std::vector<std::string>& arguments : std::vector<std::vector<std::string>>{
              {},
              {"no-such-command"},
+             {"eeprom"},
+             {"eeprom", "check", ""},
+             {"identify", "--device", ""},
              {"readout", "--no-such-option"},
              {"readout", "extra"},
              {"readout", "--repeat", "-1"},
@@ -288,6 +291,10 @@ TEST(CommandLineTest, UsageErrorsGoToStandardError) {
         EXPECT_EQ(tool.Out(), "");
         EXPECT_NE(tool.Err(), "");
     }
+    tool.Run({"no-such-command"});
+    EXPECT_NE(tool.Err().find("`ostra` has no command 'no-such-command'"), std::string::npos) << tool.Err();
+    tool.Run({"eeprom"});
+    EXPECT_NE(tool.Err().find("`ostra eeprom --help`"), std::string::npos) << tool.Err();
     EXPECT_EQ(tool.Run({"--help"}), ExitCode::Success);
     EXPECT_NE(tool.Out().find("Exit codes:"), std::string::npos);
     EXPECT_EQ(tool.Run({"--version"}), ExitCode::Success);

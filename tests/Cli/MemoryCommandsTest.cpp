@@ -133,11 +133,16 @@ TEST_P(MemoryCommandsTest, CheckAnswersWithItsExitCode) {
     EXPECT_NE(tool.Out().find("error"), std::string::npos);
     EXPECT_EQ(tool.Run({"eeprom", "check", "--json"}), ExitCode::BadData);
     EXPECT_EQ(tool.Json()["sane"], false);
-    for (const char* command : {"calibration", "log"}) {
-        EXPECT_EQ(tool.Run({command, "show"}), ExitCode::BadData) << command;
+    for (const std::vector<std::string>& command :
+         std::vector<std::vector<std::string>>{{"eeprom", "show"},
+                                               {"calibration", "show"},
+                                               {"calibration", "set", "1211=1"},
+                                               {"log", "show"},
+                                               {"log", "reset"}}) {
+        EXPECT_EQ(tool.Run(command), ExitCode::BadData);
+        EXPECT_NE(tool.Err().find(Identifier() + ": the driver cannot use"), std::string::npos) << tool.Err();
+        EXPECT_NE(tool.Err().find("`ostra eeprom check --device sim`"), std::string::npos) << tool.Err();
     }
-    EXPECT_EQ(tool.Run({"eeprom", "show"}), ExitCode::BadData);
-    EXPECT_NE(tool.Err().find("eeprom check"), std::string::npos) << tool.Err();
     Succeed({"eeprom", "backup", backup});  // whatever it holds
     EXPECT_EQ(ReadFile(backup), damaged);
     Succeed({"binary", "get", folder.Path("block")});
@@ -319,6 +324,7 @@ TEST_P(MemoryCommandsTest, ChangesOfAnImageFileNeedNoInstrument) {
     EXPECT_EQ(ReadFile(image), expected);
     EXPECT_EQ(folder.Files(), (std::vector<std::string>{"block", "image"})) << "no backups of files";
     EXPECT_EQ(tool.Run({"word", "get", "--image", image, "--device", "sim"}), ExitCode::Usage);
+    EXPECT_EQ(tool.Run({"log", "reset", "--image", ""}), ExitCode::Usage) << "does not mean an instrument";
 }
 
 TEST_P(MemoryCommandsTest, LogResetEmptiesBothCopies) {
@@ -407,11 +413,17 @@ TEST_P(RamTest, OldFirmwareHasOneMode) {
     Simulator::InstrumentSettings settings;
     settings.firmware = Simulator::OldFirmware;
     auto& instrument = host.Add("sim", settings);
+    const auto expectParameters = [&instrument] {
+        instrument.WithCommands([](const auto& commands) {
+            EXPECT_EQ(commands.parameters.p1, 1000);
+            EXPECT_EQ(commands.parameters.p2, 10);
+        });
+    };
     Succeed({"ram", "set", "2009=0.068", "2001=0.0884"});
-    instrument.WithCommands([](const auto& commands) {
-        EXPECT_EQ(commands.parameters.p1, 1000);
-        EXPECT_EQ(commands.parameters.p2, 10);
-    });
+    expectParameters();
+    EXPECT_EQ(tool.Run({"ram", "set", "2009=4.4565"}), ExitCode::BadData) << "its 16 bits would be cut off";
+    EXPECT_NE(tool.Err().find("the longest is 4.45638 s"), std::string::npos) << tool.Err();
+    expectParameters();
 }
 
 TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
@@ -431,6 +443,9 @@ TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
         EXPECT_NE(tool.Err().find("mode 3: 0.001 s to 0.65535 s"), std::string::npos) << tool.Err();
         EXPECT_EQ(modeOf(), 2) << "back in its mode";
     }
+    EXPECT_EQ(tool.Run({"ram", "set", "2009=0.05", "2001=600"}), ExitCode::BadData);
+    EXPECT_NE(tool.Err().find("the longest is 579.329 s"), std::string::npos) << tool.Err();
+    EXPECT_EQ(modeOf(), 2) << "back in its mode";
 }
 
 TEST_P(RamTest, RefusesWhatCannotBeSet) {
@@ -438,6 +453,18 @@ TEST_P(RamTest, RefusesWhatCannotBeSet) {
     for (const char* assignment : {"2012=1", "2021=1", "2005=1", "1211=1", "2009=x", "2010=1,2", "2009"}) {
         EXPECT_EQ(tool.Run({"ram", "set", assignment}), ExitCode::Usage) << assignment;
     }
+    for (const char* assignment : {"2009=-1", "2001=-0.1", "2010=-1", "9189=65536"}) {
+        EXPECT_EQ(tool.Run({"ram", "set", assignment}), ExitCode::BadData) << assignment;
+    }
+}
+
+TEST_P(RamTest, TellsWhatElseHasChanged) {
+    auto& instrument = host.Add("sim");
+    EXPECT_EQ(tool.Run({"ram", "set", "9189=300"}), ExitCode::Usage) << "it would have no effect";
+    Succeed({"ram", "set", "9189=300", "2008=1", "--json"});
+    EXPECT_EQ(tool.Json()["changes"], nlohmann::json::parse(R"([{"id":9189,"before":-1,"after":300},
+        {"id":2008,"before":0,"after":0},{"id":2010,"before":1,"after":300}])"));
+    EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.parameters.p3; }), 300);
 }
 
 }  // namespace

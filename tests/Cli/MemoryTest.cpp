@@ -374,7 +374,8 @@ TEST(ImageDiffTest, AnImageThatCannotBeReadIsComparedByArea) {
     EepromImage b = a;
     b[Map::Table] = 9;
     const ImageDiff diff = Compare(a, b);
-    EXPECT_EQ(diff.unreadable, "corrupt EAT detected!!");
+    EXPECT_EQ(diff.unreadableA, "");
+    EXPECT_EQ(diff.unreadableB, "corrupt EAT detected!!");
     ASSERT_EQ(diff.areas.size(), 1u);
     EXPECT_EQ(diff.areas[0].name, "allocation table");
 }

@@ -51,6 +51,15 @@ Integer Truncated(double value) {
     return static_cast<Integer>(value);
 }
 
+/// A whole number of microseconds where the float's own rounding is all that keeps it from one: a time of
+/// 0.00884 s means 8840 of them, although no float is 0.00884.
+double Microseconds(float seconds) {
+    const double product = double{seconds} * MicrosecondsPerSecond;
+    const double whole = std::round(product);
+    const double rounding = std::abs(product) * (std::numeric_limits<float>::epsilon() / 2);
+    return std::abs(product - whole) <= rounding ? whole : product;
+}
+
 /// Rounds to the nearest count and keeps the 16 bits that the instrument takes.
 std::uint16_t Count(double units) {
     return static_cast<std::uint16_t>(Truncated<std::int32_t>(units + 0.5));
@@ -192,7 +201,7 @@ void PellandoRAM::SwitchToPerfectMode(const Properties& set) try {
         perfectMode = false;
         return;
     }
-    const double wanted = double{set.GetProperty(IntegrationTime).AsFloat()} * MicrosecondsPerSecond;
+    const double wanted = Microseconds(set.GetProperty(IntegrationTime).AsFloat());
     const auto microseconds = static_cast<std::uint32_t>(Truncated<std::int64_t>(wanted));
     std::uint8_t mode = 0;
     for (int round = 0; round < MostModes; ++round) {

@@ -279,12 +279,12 @@ TEST_F(ModeSearch, TakesTheFirstModeThatFits) {
     };
     for (const Case& row : {
              Case{"first mode", 68000, {1}, true, 1000},
-             Case{"shortest of the first", 8840.5, {1}, true, 130},
-             Case{"too short for the first", 8839.5, {1, 2}, false, 442},
-             Case{"shortest of the second", 2000.5, {1, 2}, false, 100},
-             Case{"last mode", 1999.5, {1, 2, 3}, true, 400},
-             Case{"shortest of all", 50.2, {1, 2, 3}, true, 10},
-             Case{"longest of all", 4456378, {1}, true, 65535},
+             Case{"shortest of the first", 8840, {1}, true, 130},
+             Case{"too short for the first", 8839, {1, 2}, false, 442},
+             Case{"shortest of the second", 2000, {1, 2}, false, 100},
+             Case{"last mode", 1999, {1, 2, 3}, true, 400},
+             Case{"shortest of all", 50, {1, 2, 3}, true, 10},
+             Case{"longest of all", 4456379, {1}, true, 65535},
          }) {
         SCOPED_TRACE(row.name);
         Want(row.microseconds);
@@ -320,7 +320,7 @@ TEST_F(ModeSearch, RefusesTimesThatNoModeCanCount) {
     constexpr const char* high = "Integration time too high";
     constexpr const char* low = "Integration time too low";
     for (const Case& row : {
-             Case{"first count that is too much", 4.4563805F, high, 1},
+             Case{"first count that is too much", 4.45638F, high, 1},
              Case{"the template's -1", -1.0F, high, 1},
              Case{"too short for the last", 49e-6F, low, 3},
              Case{"nothing", 0, low, 3},
