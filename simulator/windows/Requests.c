@@ -30,9 +30,16 @@ NTSTATUS NTAPI DispatchClose(DEVICE_OBJECT* device, IRP* packet) {
     if (file)
         StandInClose(file);
     CompleteAtOnce(packet, STATUS_SUCCESS, 0);
+    if (!file || --extension->openFiles != 0)
+        return STATUS_SUCCESS;
     /* A pipe of an instrument that was unplugged has waited for its last file. */
-    if (file && --extension->openFiles == 0 && extension->pipe && !extension->instrument)
+    if (extension->pipe && !extension->instrument)
         IoDeleteDevice(device);
+    /* Wine opens a file even when the driver refuses it, but not without its name. (The USBIO driver refuses
+     * nothing here: its hosts learn it from a later request.) */
+    else if (!isUsbIo && !extension->pipe && extension->instrument &&
+             StandInIsUsedElsewhere(extension->instrument))
+        IoDeleteSymbolicLink(&extension->link);
     return STATUS_SUCCESS;
 }
 

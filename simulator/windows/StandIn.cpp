@@ -53,6 +53,10 @@ void StandInUnplug(StandInInstrument* instrument) {
     delete instrument;
 }
 
+int StandInIsUsedElsewhere(const StandInInstrument* instrument) {
+    return instrument->object->IsUsedElsewhere() ? 1 : 0;
+}
+
 Status StandInOpen(StandInInstrument* instrument, int usbIo, unsigned long pipe, StandInFile** file) {
     return Guarded([&] {
         Varnholt::Platform::ErrorCode error = Errors::Success;

@@ -40,6 +40,9 @@ STAND_IN_API StandInInstrument* StandInPlugIn(unsigned long index);
 /* Unplugs it: what runs on it ends. The object is gone with its last file. */
 STAND_IN_API void StandInUnplug(StandInInstrument* instrument);
 
+/* Whether somebody else has taken the device, or takes it when its last file is closed. */
+STAND_IN_API int StandInIsUsedElsewhere(const StandInInstrument* instrument);
+
 /* Opens the device (pipe 0) or a pipe; `usbIo` chooses the driver's behaviour. */
 STAND_IN_API Status StandInOpen(StandInInstrument* instrument, int usbIo, unsigned long pipe,
                                 StandInFile** file);

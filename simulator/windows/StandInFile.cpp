@@ -165,7 +165,7 @@ std::optional<Status> StandInFileObject::TestControl(std::uint32_t code, std::sp
             instrument->interfaceVersion = Protocol::LoadLittle16(input.data());
             break;
         case TestControls::UseElsewhere:
-            instrument->UseElsewhere(!input.empty() && input[0] != 0);
+            instrument->UseElsewhere();
             break;
         case TestControls::ReadEeprom: {
             const std::vector<std::uint8_t> content = simulated.Eeprom();

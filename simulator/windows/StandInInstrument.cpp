@@ -110,12 +110,4 @@ void StandInInstrumentObject::SetFaults(const std::string& plan) {
     Bus().SetFaults(name, FaultPlan::Parse(plan));
 }
 
-void StandInInstrumentObject::UseElsewhere(bool used) {
-    const std::lock_guard held(lock);
-    usedElsewhere = used;
-    if (!used) {
-        otherUser.reset();
-    }
-}
-
 }  // namespace Varnholt::Simulator

@@ -38,8 +38,9 @@ class StandInInstrumentObject final : public Platform::Drivers::EndpointCancelle
 
     SimulatedInstrument& Simulated();
     void SetFaults(const std::string& plan);
-    /// Takes effect at the next opening of a device that is not open.
-    void UseElsewhere(bool used);
+    /// For good, from the next opening of a device that is not open.
+    void UseElsewhere() { usedElsewhere = true; }
+    bool IsUsedElsewhere() const { return usedElsewhere; }
 
     std::atomic<std::uint16_t> interfaceVersion = Protocol::UsbIoDriver::InterfaceVersion;
 
@@ -48,11 +49,11 @@ class StandInInstrumentObject final : public Platform::Drivers::EndpointCancelle
 
     const std::string name;
     std::atomic<bool> unplugged = false;
+    std::atomic<bool> usedElsewhere = false;
     std::mutex lock;  // guards what follows
     std::set<StandInFileObject*> files;
     std::weak_ptr<Platform::Drivers::SharedDevice> device;
     std::weak_ptr<Platform::Drivers::UsbIoDevice> usbIoDevice;
-    bool usedElsewhere = false;
     std::shared_ptr<Platform::Usb::UsbDevice> otherUser;
 };
 

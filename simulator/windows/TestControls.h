@@ -16,8 +16,7 @@ inline constexpr std::uint32_t PressButton = Code(0x900);
 inline constexpr std::uint32_t SetFaults = Code(0x901);
 /// Input: 2 bytes, what the driver information gives as the interface version, least significant byte first.
 inline constexpr std::uint32_t SetInterfaceVersion = Code(0x902);
-/// Input: 1 byte; not 0: once all handles are closed somebody else has the USB device, and openings that need
-/// it are refused.
+/// Once all handles are closed somebody else has the USB device, and openings that need it are refused.
 inline constexpr std::uint32_t UseElsewhere = Code(0x903);
 /// Output: the content of the EEPROM.
 inline constexpr std::uint32_t ReadEeprom = Code(0x904);

@@ -29,14 +29,24 @@ std::string ThisProgram() {
 }  // namespace
 
 ChildProcess::ChildProcess(const std::string& task, const std::string& argument)
-    : ChildProcess('"' + ThisProgram() + "\" \"" + ShippedLibrary::path + "\" " + task + " \"" + argument +
-                   '"') {}
+    : ChildProcess(Program{'"' + ThisProgram() + "\" \"" + ShippedLibrary::path + "\" " + task + " \"" +
+                           argument + '"'}) {}
 
-ChildProcess::ChildProcess(std::string commandLine) : ready(CreateEventA(nullptr, FALSE, FALSE, ReadyEvent)) {
+ChildProcess::ChildProcess(Program program) : ready(CreateEventA(nullptr, FALSE, FALSE, ReadyEvent)) {
     STARTUPINFOA startup{};
     startup.cb = sizeof startup;
-    CreateProcessA(nullptr, commandLine.data(), nullptr, nullptr, FALSE, 0, nullptr, nullptr, &startup,
-                   &process);
+    SECURITY_ATTRIBUTES inherited{sizeof inherited, nullptr, TRUE};
+    HANDLE file = nullptr;
+    if (!program.output.empty()) {
+        file = CreateFileA(program.output.c_str(), GENERIC_WRITE, FILE_SHARE_READ | FILE_SHARE_WRITE,
+                           &inherited, CREATE_ALWAYS, 0, nullptr);
+        startup.dwFlags = STARTF_USESTDHANDLES;
+        startup.hStdOutput = file;
+        startup.hStdError = file;
+    }
+    CreateProcessA(nullptr, program.commandLine.data(), nullptr, nullptr, file != nullptr, 0, nullptr,
+                   nullptr, &startup, &process);
+    CloseHandle(file);
 }
 
 ChildProcess::~ChildProcess() {

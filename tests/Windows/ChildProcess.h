@@ -14,8 +14,12 @@ class ChildProcess final {
     /// - "hold-lock": holds the named lock `argument` for `HoldMilliseconds` once it is ready;
     /// - "abandon-lock": the same, but ends without giving it back.
     ChildProcess(const std::string& task, const std::string& argument);
-    /// Another program.
-    explicit ChildProcess(std::string commandLine);
+    /// Another program; what it prints goes to the file `output` if it has a name.
+    struct Program {
+        std::string commandLine;
+        std::string output{};
+    };
+    explicit ChildProcess(Program program);
     ~ChildProcess();
     ChildProcess(const ChildProcess&) = delete;
     ChildProcess& operator=(const ChildProcess&) = delete;

@@ -4,9 +4,11 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <fstream>
+#include <iterator>
 #include <memory>
-#include <numeric>
 #include <set>
+#include <sstream>
 #include <thread>
 
 #include "ChildProcess.h"
@@ -80,7 +82,7 @@ class Shipped : public testing::Test {
     static std::unique_ptr<ShippedLibrary> library;
 
   public:
-    static std::string hostWithoutEnumeration, poorSetupApi, nativeDriver, usbIoDriver;
+    static std::string hostWithoutEnumeration, poorSetupApi, nativeDriver, usbIoDriver, tool, example;
 };
 
 std::unique_ptr<StandInDriver> Shipped::driver;
@@ -89,6 +91,8 @@ std::string Shipped::hostWithoutEnumeration;
 std::string Shipped::poorSetupApi;
 std::string Shipped::nativeDriver;
 std::string Shipped::usbIoDriver;
+std::string Shipped::tool;
+std::string Shipped::example;
 
 /// The first readout of the same instrument when everything is in this process.
 std::array<std::int32_t, OSTRA_READOUT_VALUES> ReadoutInProcess(std::uint64_t seed) {
@@ -222,12 +226,9 @@ TEST_F(Shipped, UntouchedInstrumentIsToldSoAtTheEnd) {
 }
 
 TEST_F(Shipped, InstrumentInUseElsewhereIsPassedOver) {
-    if (!StandInDriver::HostIs64Bit()) {
-        GTEST_SKIP() << "its own driver refuses the opening, and Wine does not pass on a driver's refusal";
-    }
     const std::string used = driver->PlugIn();
     const std::string free = driver->PlugIn();
-    Instrument(used).UseElsewhere(true);
+    Instrument(used).UseElsewhere();
     EXPECT_EQ(TakeReadout(used), OSTRA_FAILURE);
     EXPECT_EQ(library->LastError(), "");
     EXPECT_EQ(TakeReadout(""), OSTRA_OK) << library->LastError();
@@ -288,7 +289,7 @@ DWORD RunHostWithoutEnumeration(const std::string& folder, const std::string& na
     RegSetValueExA(key, "setupapi", 0, REG_SZ, reinterpret_cast<const BYTE*>(origin.c_str()),
                    static_cast<DWORD>(origin.size() + 1));
     RegCloseKey(key);
-    return ChildProcess('"' + program + "\" \"" + ShippedLibrary::path + '"').Wait();
+    return ChildProcess(ChildProcess::Program{'"' + program + "\" \"" + ShippedLibrary::path + '"'}).Wait();
 }
 
 TEST_F(Shipped, SetupApiIsMissing) {
@@ -303,6 +304,63 @@ TEST_F(Shipped, SetupApiLacksAnEntryPoint) {
     EXPECT_EQ(RunHostWithoutEnumeration("C:\\poor", "poor.exe", "native"), 0U);
 }
 
+std::string Quoted(const std::string& path) {
+    return '"' + path + '"';
+}
+
+std::string Content(const std::string& path) {
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+constexpr const char* PrintedPath = "C:\\printed";
+
+/// Runs a program to its end; gives its exit code and what it printed.
+std::pair<DWORD, std::string> RunProgram(const std::string& commandLine) {
+    const DWORD code = ChildProcess(ChildProcess::Program{commandLine, PrintedPath}).Wait();
+    return {code, Content(PrintedPath)};
+}
+
+/// From an image made by the tool to a readout by the example host.
+TEST_F(Shipped, ProgramsDoTheWholeJob) {
+    const std::string listing = Quoted(tool) + " list --json";
+    EXPECT_EQ(RunProgram(listing).first, 3U) << "no instrument is connected";
+    const std::string path = driver->PlugIn();
+    const auto [code, printed] = RunProgram(listing);
+    EXPECT_EQ(code, 0U) << printed;
+    EXPECT_THAT(printed, HasSubstr(StandInDriver::HostIs64Bit() ? R"("transport":"usbio")"
+                                                                : R"("transport":"native")"));
+    EXPECT_THAT(printed, HasSubstr(path.substr(path.find("#ostra#"))));
+
+    EXPECT_EQ(RunProgram(Quoted(tool) + " eeprom new C:\\image").first, 0U) << Content(PrintedPath);
+    const auto [exampleCode, values] =
+        RunProgram(Quoted(example) + ' ' + Quoted(ShippedLibrary::path) + " \"\" C:\\image");
+    EXPECT_EQ(exampleCode, 0U) << values;
+    std::istringstream stream(values);
+    EXPECT_THAT(std::vector<std::int32_t>(std::istream_iterator<std::int32_t>(stream), {}),
+                testing::ElementsAreArray(ReadoutInProcess(driver->SeedOf(path))));
+    const std::string image = Content("C:\\image");
+    EXPECT_EQ(Instrument(path).Eeprom(), std::vector<BYTE>(image.begin(), image.end()));
+}
+
+TEST_F(Shipped, ToolShowsTheButtonAndTheRemoval) {
+    const std::string path = driver->PlugIn();
+    ChildProcess monitor(ChildProcess::Program{Quoted(tool) + " monitor --for 15", PrintedPath});
+    const auto shows = [](const char* text) {
+        for (int look = 0; look < 400 && Content(PrintedPath).find(text) == std::string::npos; ++look) {
+            Sleep(20);
+        }
+        return testing::AssertionResult(Content(PrintedPath).find(text) != std::string::npos)
+               << Content(PrintedPath);
+    };
+    EXPECT_TRUE(shows("watching"));
+    Instrument(path).PressButton();
+    EXPECT_TRUE(shows(" s  button"));
+    driver->Unplug(path);
+    EXPECT_TRUE(shows(" s  removed"));
+    EXPECT_EQ(monitor.Wait(), 0U);
+}
+
 }  // namespace
 }  // namespace Varnholt::Tests
 
@@ -313,8 +371,9 @@ int main(int argc, char** argv) {
         ShippedLibrary::path = argv[1];
         return RunAsChild(argv[2], argv[3]);
     }
-    if (argc != 6) {
-        std::puts("usage: shipped_library_test LIBRARY HOST SETUPAPI NATIVE-DRIVER USBIO-DRIVER");
+    if (argc != 8) {
+        std::puts(
+            "usage: shipped_library_test LIBRARY HOST SETUPAPI NATIVE-DRIVER USBIO-DRIVER TOOL EXAMPLE");
         return 2;
     }
     ShippedLibrary::path = argv[1];
@@ -322,5 +381,7 @@ int main(int argc, char** argv) {
     Shipped::poorSetupApi = argv[3];
     Shipped::nativeDriver = argv[4];
     Shipped::usbIoDriver = argv[5];
+    Shipped::tool = argv[6];
+    Shipped::example = argv[7];
     return RUN_ALL_TESTS();
 }

@@ -184,11 +184,6 @@ void Instrument::SetInterfaceVersion(WORD version) {
     Control(Simulator::TestControls::SetInterfaceVersion, &version, sizeof version);
 }
 
-void Instrument::UseElsewhere(bool used) {
-    const BYTE value = used ? 1 : 0;
-    Control(Simulator::TestControls::UseElsewhere, &value, sizeof value);
-}
-
 std::vector<BYTE> Instrument::Eeprom() {
     std::vector<BYTE> content(8192);
     content.resize(Control(Simulator::TestControls::ReadEeprom, nullptr, 0, content.data(), content.size()));

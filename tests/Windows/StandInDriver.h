@@ -59,7 +59,7 @@ class Instrument final {
     void PressButton() { Control(Simulator::TestControls::PressButton); }
     void SetFaults(const std::string& plan);
     void SetInterfaceVersion(WORD version);
-    void UseElsewhere(bool used);
+    void UseElsewhere() { Control(Simulator::TestControls::UseElsewhere); }
     std::vector<BYTE> Eeprom();
     Simulator::TestControls::Counts Counts();
 
