@@ -140,10 +140,10 @@ TEST_P(ScanTest, CtrlCEndsAScanAndLeavesTheInstrumentUsable) {
          {std::vector<std::string>{"scan"}, std::vector<std::string>{"scan", "--total", "90000000"}}) {
         Cli::Interruption interruption;
         tool.interruption = &interruption;
-        auto& scheduler = Platform::ClockScheduler();
-        scheduler.CallAt(scheduler.Now() + 10'000'000, [&] { interruption.Request(); });
         const auto resets = instrument.WithCommands([](const auto& commands) { return commands.resets; });
         const Stopwatch watch(clock);
+        auto& scheduler = Platform::ClockScheduler();
+        scheduler.CallAt(scheduler.Now() + 10'000'000, [&] { interruption.Request(); });
         std::vector<std::string> arguments = kind;
         arguments.insert(arguments.end(), {"--output", folder.Path("csv")});
         EXPECT_EQ(tool.Run(arguments), ExitCode::Interrupted) << tool.Err();

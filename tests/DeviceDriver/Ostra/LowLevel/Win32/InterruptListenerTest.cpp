@@ -179,7 +179,11 @@ TEST_F(NativeInterruptListenerFailure, ThreadThatHangsIsLeftToItselfInTime) {
     }
     watch.Expect(2000 + 11'000);
     SleepMilliseconds(3000);
+#if defined(_WIN32)
+    EXPECT_THAT(driver.TakeTranscript(), IsEmpty()) << "there a thread can be ended by force";
+#else
     EXPECT_THAT(driver.TakeTranscript(), ElementsAre("open native/1\\PIPE03", "close native/1\\PIPE03"));
+#endif
 }
 
 TEST_F(NativeInterruptListenerFailure, ReadThatCannotBeCancelledEndsWithThePipe) {

@@ -73,10 +73,10 @@ class AbandonedMutex final {
     Platform::OwnedHandle mutex;
 };
 
-/// A handle that names nothing.
+/// A handle that names nothing. (That of an object which is no more could come to name another.)
 inline Platform::Handle NamesNothing() {
-    Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
-    return event.Get();
+    static int object;
+    return &object;
 }
 
 /// Runs a function on a thread of the platform; waits for its end.

@@ -164,6 +164,9 @@ TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
     };
     for (const TransferCase& row : cases) {
         SCOPED_TRACE(row.name);
+        if (row.milliseconds > 1000 && row.text.empty() && !clock.IsVirtual()) {
+            continue;  // the last moment is a millisecond
+        }
         const bool isWrite = row.operation == Write64;
         const std::uint32_t pipe = row.operation == Read64 ? 1 : isWrite ? 2 : 0;
         USBConnection connection("native/1", pipe, NoHandle);
@@ -300,7 +303,8 @@ class UsbConnectionVectorRead : public NativeTest {
 };
 
 TEST_F(UsbConnectionVectorRead, GivesWhatCame) {
-    EXPECT_EQ(Read({.data = Counting(3, 1), .after = 100'000}), 3u);
+    const std::uint32_t late = clock.IsVirtual() ? 100'000 : 100;
+    EXPECT_EQ(Read({.data = Counting(3, 1), .after = late}), 3u);
     EXPECT_THAT(buffer, ElementsAre(1, 2, 3, 0, 0, 0, 0, 0));
     EXPECT_EQ(Read({.data = Counting(9, 1), .after = 1}), 8u);
     EXPECT_EQ(Read({.after = 5}), 0u);
@@ -311,11 +315,11 @@ TEST_F(UsbConnectionVectorRead, GivesWhatCame) {
 
 TEST_F(UsbConnectionVectorRead, EndsWhenSomebodySignalsItsEvent) {
     const auto signal = [this] { SignalEvent(event.Get()); };
-    ClockScheduler().CallAt(ClockScheduler().Now() + 1000, signal);
+    ClockScheduler().CallAt(ClockScheduler().Now() + 100'000, signal);
     EXPECT_EQ(Read({.after = Never}), 0u);
     EXPECT_EQ(driver.RunningTransfers(), 0u);
 
-    ClockScheduler().CallAt(ClockScheduler().Now() + 1000, signal);
+    ClockScheduler().CallAt(ClockScheduler().Now() + 100'000, signal);
     EXPECT_EQ(Read({.data = Counting(2, 1), .after = Never, .cancelledAfter = 3, .cancelledWithData = true}),
               2u)
         << "data that arrive during the cancellation count";
