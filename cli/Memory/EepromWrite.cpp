@@ -42,8 +42,7 @@ std::vector<WritePiece> PiecesToWrite(const EepromImage& present, const EepromIm
     const std::uint32_t step = granularity == Granularity::Pieces ? Protocol::EepromWritePiece : ElementSize;
     std::vector<WritePiece> pieces;
     for (std::uint32_t at = 0; at < Protocol::EepromSize; at += step) {
-        const auto offset = static_cast<std::ptrdiff_t>(at);
-        if (std::equal(wanted.begin() + offset, wanted.begin() + offset + step, present.begin() + offset)) {
+        if (std::equal(wanted.data() + at, wanted.data() + at + step, present.data() + at)) {
             continue;
         }
         const bool continues = !pieces.empty() && pieces.back().address + pieces.back().length == at &&

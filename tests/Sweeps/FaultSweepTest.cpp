@@ -10,6 +10,7 @@
 #include <numeric>
 #include <optional>
 #include <regex>
+#include <span>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
@@ -239,10 +240,9 @@ bool NeverEnds(const Operation& operation, const Fault& fault) {
 Fault CountedByEndpoint(Fault fault, const std::vector<RecordedTransfer>& undisturbed) {
     const std::uint8_t endpoint = undisturbed[fault.index].endpoint;
     fault.scope = Simulator::ScopeOfEndpoint(endpoint);
-    const auto end = undisturbed.begin() + fault.index;
-    fault.index = static_cast<std::uint32_t>(std::count_if(
-        undisturbed.begin(), end,
-        [endpoint](const RecordedTransfer& transfer) { return transfer.endpoint == endpoint; }));
+    const std::span before(undisturbed.data(), fault.index);
+    fault.index =
+        static_cast<std::uint32_t>(std::ranges::count(before, endpoint, &RecordedTransfer::endpoint));
     return fault;
 }
 
