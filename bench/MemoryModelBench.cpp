@@ -1,7 +1,9 @@
 #include <benchmark/benchmark.h>
 
 #include <cstdint>
+#include <optional>
 
+#include "BenchHost.h"
 #include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEAT.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
@@ -66,6 +68,32 @@ void DumpModel(benchmark::State& state) {
     }
 }
 BENCHMARK(DumpModel)->ArgName("entries")->Arg(FreshEntries)->Arg(84)->Unit(benchmark::kMicrosecond);
+
+/// Loading the model from the simulated instrument against two reads of 4096 bytes by the same commands,
+/// alternately. What the model writes when it is destroyed is left out.
+void LoadModel(benchmark::State& state) {
+    Bench::BenchHost host(state.range(0) != 0, {});
+    const Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionality> instrument(
+        new PellandoFunctionality(nullptr, 0));
+    double bare = 0;
+    double loaded = 0;
+    for (auto _ : state) {
+        bare += Bench::Seconds([&] {
+            for (const std::uint32_t address : {0U, Protocol::EepromSize / 2}) {
+                Bytes half(Protocol::EepromSize / 2);
+                instrument->ReadEEPROM(address, half);
+                benchmark::DoNotOptimize(half.data());
+            }
+        });
+        std::optional<PellandoEEPROM> eeprom;
+        const double took = Bench::Seconds([&] { eeprom.emplace(instrument); });
+        loaded += took;
+        state.SetIterationTime(took);
+    }
+    state.counters["of_bare"] = bare / loaded;
+}
+BENCHMARK(LoadModel)->ArgName("usbio")->Arg(0)->Arg(1)->UseManualTime()->Iterations(200)->Unit(
+    benchmark::kMicrosecond);
 
 }  // namespace
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

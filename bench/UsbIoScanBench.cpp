@@ -1,59 +1,20 @@
 #include <benchmark/benchmark.h>
 
 #include <array>
-#include <chrono>
 #include <ctime>
 #include <fstream>
-#include <functional>
-#include <memory>
 #include <string>
 #include <vector>
 
 #include "BareLoop.h"
+#include "BenchHost.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
 #include "ostra.h"
-#include "Platform/Drivers/DriverFileSystem.h"
-#include "Platform/EventScheduler.h"
-#include "Platform/HostQueries.h"
-#include "Platform/Time.h"
-#include "SimulatedBus.h"
 
 namespace Varnholt::Bench {
 namespace {
 
 using DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
-
-/// A simulated instrument that the library reaches over USBIO, or over its own driver.
-class BenchHost final {
-  public:
-    BenchHost(bool overUsbIo, Simulator::InstrumentSettings settings) {
-        Platform::Override64BitHost(overUsbIo);
-        Platform::ObserveBeeps([](std::uint32_t, std::uint32_t) {});
-        bus.Add("bench", std::move(settings));
-    }
-    ~BenchHost() {
-        Platform::ObserveBeeps({});
-        Platform::Override64BitHost(std::nullopt);
-    }
-    BenchHost(const BenchHost&) = delete;
-    BenchHost& operator=(const BenchHost&) = delete;
-
-    std::shared_ptr<Platform::Usb::UsbDevice> Open() {
-        Platform::ErrorCode error = 0;
-        return bus.Open("bench", error);
-    }
-
-  private:
-    Simulator::SimulatedBus bus{Platform::ClockScheduler()};
-    const std::unique_ptr<Platform::DeviceFileSystem> files = Platform::Drivers::MakeDriverFileSystem(bus);
-    const Platform::ScopedDeviceFiles inForce{*files};
-};
-
-double Seconds(const std::function<void()>& action) {
-    const auto begin = std::chrono::steady_clock::now();
-    action();
-    return std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count();
-}
 
 /// Bytes of physical memory that the process has used at most since `ForgetPeak`.
 double PeakMemory() {

@@ -16,7 +16,7 @@ namespace {
 
 constexpr const char* Footer = R"(
 A simulated instrument is found by libostra and by the tool ostra like a real one, under the name
-simulated-NAME, for as long as this program runs; only programs of the same user, or of root, can use it.
+simulated-NAME, for as long as this program runs; only programs of the same user can use it.
 Ending the program unplugs the instrument. One program at a time can have an instrument open.
 
 Examples:

@@ -121,7 +121,11 @@ Answer Try(Session& session, const std::string& shortName) {
         instrument.Commands().GetMISC(m1, m2, m3, m4, m5);
         return {m2, std::nullopt};
     } catch (...) {
-        return {0, session.Explain(std::current_exception())};
+        FailureReport failure = session.Explain(std::current_exception());
+        if (failure.message.starts_with(*listed + ": ")) {
+            failure.message.erase(0, listed->size() + 2);  // a finding begins with its subject
+        }
+        return {0, failure};
     }
 }
 

@@ -134,6 +134,9 @@ bool InterruptibleDeviceFiles::CloseFile(Handle file) {
 bool InterruptibleDeviceFiles::Refuse(Overlapped& record) const {
     record.internal = 0;
     record.internalHigh = 0;
+    if (record.event != NoHandle) {
+        SignalEvent(record.event);
+    }
     SetLastError(Errors::OperationAborted);
     return false;
 }

@@ -27,7 +27,9 @@ class InterruptibleDeviceFiles final : public DeviceFileSystem {
     InterruptibleDeviceFiles& operator=(const InterruptibleDeviceFiles&) = delete;
 
     /// Ends the reads and writes that run, and refuses new transfers and controls with
-    /// `Errors::OperationAborted` until `Resume`. Returns within 2 s for each pipe. Any thread.
+    /// `Errors::OperationAborted` until `Resume`. The event of what is refused is signalled: the instrument's
+    /// own driver has callers that wait for it although nothing was started. Returns within 2 s for each
+    /// pipe. Any thread.
     void Interrupt();
     /// Transfers may start again.
     void Resume();

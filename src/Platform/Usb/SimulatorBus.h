@@ -23,7 +23,7 @@ struct SimulatorInfo {
 /// All of them, ordered by name.
 std::vector<SimulatorInfo> ListSimulators();
 
-/// The bus of the simulated instruments that run as programs of the same user or of root.
+/// The bus of the simulated instruments that run as programs of the same user.
 UsbBus& SimulatorBus();
 
 }  // namespace Varnholt::Platform::Usb

@@ -74,6 +74,7 @@ TEST_F(InterruptibleDeviceFilesTest, NothingStartsUntilItIsResumed) {
     EXPECT_FALSE(files->StartControl(control, Protocol::NativeDriver::ControlVendorRequest, reset.data(),
                                      static_cast<std::uint32_t>(reset.size()), nullptr, 0, request.record));
     EXPECT_EQ(Platform::LastError(), Errors::OperationAborted);
+    EXPECT_TRUE(request.TakeSignal()) << "nobody must wait for what is refused";
     interruptible->Resume();
     StartPending(pipe, buffer, request);
     device->Send(BulkInEndpoint, Counting(16));
