@@ -1,12 +1,14 @@
 #include "StandInFile.h"
 
 #include <algorithm>
+#include <atomic>
 #include <cstring>
 #include <stdexcept>
 #include <utility>
 #include <vector>
 
 #include "KernelStatus.h"
+#include "Platform/EventScheduler.h"
 #include "Protocol/ByteOrder.h"
 #include "TestControls.h"
 
@@ -28,10 +30,13 @@ class StandInFileObject::Running final : public Platform::Usb::TransferClient {
             completed.status = Platform::Usb::TransferStatus::DeviceGone;
         }
         file->driver->Device().Learn(completed);
-        file->Ended(*this, KernelStatus(file->driver->OutcomeOf(completed.status)));
+        const bool wasGivenUp = givenUp && completed.status == Platform::Usb::TransferStatus::Cancelled;
+        file->Ended(*this, KernelStatus(wasGivenUp ? file->driver->TimedOutCode()
+                                                   : file->driver->OutcomeOf(completed.status)));
     }
 
     Transfer transfer;
+    std::atomic<bool> givenUp = false;  ///< the driver cancels it because its time is over
     const std::shared_ptr<StandInFileObject> file;
     const StandInRequest request;
 };
@@ -90,6 +95,7 @@ Status StandInFileObject::Start(const Decision& decision, const std::shared_ptr<
         const std::lock_guard held(lock);
         requests.emplace(running->request.number, running);
     }
+    LimitTime(*running);
     running->request.pending(running->request.packet);
     const Platform::ErrorCode refusal = driver->Device().Submit(running->transfer);
     if (refusal != Platform::Errors::Success) {
@@ -97,6 +103,23 @@ Status StandInFileObject::Start(const Decision& decision, const std::shared_ptr<
         Ended(*running, KernelStatus(driver->RefusalOf(refusal)));
     }
     return StatusPending;
+}
+
+void StandInFileObject::LimitTime(const Running& running) {
+    const std::uint32_t limit = driver->TimeLimitOf(running.transfer);
+    if (limit == 0) {
+        return;
+    }
+    auto& scheduler = Platform::ClockScheduler();
+    const auto giveUp = [file = weak_from_this(), number = running.request.number] {
+        if (const auto living = file.lock()) {
+            living->CancelThose([number](unsigned long candidate, Running& found) {
+                found.givenUp = found.givenUp || candidate == number;
+                return candidate == number;
+            });
+        }
+    };
+    scheduler.CallAt(scheduler.Now() + std::uint64_t{limit} * 1000, giveUp);
 }
 
 void StandInFileObject::Ended(Running& running, Status status) {

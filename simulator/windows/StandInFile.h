@@ -37,6 +37,7 @@ class StandInFileObject final : public std::enable_shared_from_this<StandInFileO
 
     Status Start(const Platform::Drivers::Decision& decision, const std::shared_ptr<Running>& running,
                  unsigned long& bytes);
+    void LimitTime(const Running& running);
     void Ended(Running& running, Status status);
     std::optional<Status> TestControl(std::uint32_t code, std::span<const std::uint8_t> input,
                                       std::span<std::uint8_t> output, unsigned long& bytes);
