@@ -135,6 +135,16 @@ std::shared_ptr<UsbDevice> TransferRecorder::Record(std::shared_ptr<UsbDevice> d
     return std::make_shared<Device>(std::move(device), *this);
 }
 
+std::string TransferRecorder::Text(std::size_t most) const {
+    std::string text;
+    for (const RecordedTransfer& transfer : Transfers()) {
+        if (transfer.endpoint != Protocol::InterruptInEndpoint) {
+            text += transfer.Text(most) + "\n";
+        }
+    }
+    return text;
+}
+
 std::vector<RecordedTransfer> TransferRecorder::Transfers() const {
     const std::lock_guard lock(mutex);
     return transfers;

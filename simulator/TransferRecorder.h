@@ -32,6 +32,9 @@ class TransferRecorder final {
     std::shared_ptr<Platform::Usb::UsbDevice> Record(std::shared_ptr<Platform::Usb::UsbDevice> device);
 
     std::vector<RecordedTransfer> Transfers() const;
+    /// A text with a line for each, `RecordedTransfer::Text`; those of the interrupt endpoint are left out:
+    /// when they happen is the business of a thread of the host.
+    std::string Text(std::size_t most) const;
     /// The number of transfers so far; a fault plan's index counts the same way.
     std::size_t Count() const;
     void Clear();

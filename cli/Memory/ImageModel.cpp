@@ -73,7 +73,9 @@ LogCopies ReadLogCopies(const EepromImage& image) {
 
 EepromImage FreshImage() {
     EepromImage image(Protocol::EepromSize, UnusedByte);
-    const auto at = [&image](std::uint32_t address) { return image.begin() + std::ptrdiff_t{address}; };
+    const auto at = [&image](std::uint32_t address) {
+        return image.begin() + static_cast<std::ptrdiff_t>(address);
+    };
     PellandoEAT table;
     table.InitializeEmtpyEAT();
     table.Dump(at(EepromMap::Table), at(EepromMap::Calibration));

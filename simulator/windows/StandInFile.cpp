@@ -195,6 +195,11 @@ std::optional<Status> StandInFileObject::TestControl(std::uint32_t code, std::sp
             answer(content.data(), content.size());
             break;
         }
+        case TestControls::TakeTranscript: {
+            const std::string transcript = StandInInstrumentObject::TakeTranscript();
+            answer(transcript.data(), transcript.size());
+            break;
+        }
         case TestControls::ReadCounts: {
             const auto counts = simulated.WithCommands([](const Commands& commands) {
                 return TestControls::Counts{static_cast<std::uint32_t>(commands.measurements),

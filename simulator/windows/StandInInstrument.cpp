@@ -7,15 +7,29 @@
 #include "Platform/EventScheduler.h"
 #include "SimulatedBus.h"
 #include "StandInFile.h"
+#include "TestControls.h"
+#include "TransferRecorder.h"
 
 namespace Varnholt::Simulator {
 namespace {
 
 namespace Drivers = Platform::Drivers;
 
-/// Never destroyed: the driver process is ended, not left in an orderly way.
+// Never destroyed: the driver process is ended, not left in an orderly way.
+
+TransferRecorder& Recorder() {
+    static auto& recorder = *new TransferRecorder;
+    return recorder;
+}
+
+SimulatedBus* MakeRecordedBus() {
+    auto* const bus = new SimulatedBus(Platform::ClockScheduler());
+    bus->WrapDevices([](const std::string&, auto device) { return Recorder().Record(std::move(device)); });
+    return bus;
+}
+
 SimulatedBus& Bus() {
-    static auto& bus = *new SimulatedBus(Platform::ClockScheduler());
+    static auto& bus = *MakeRecordedBus();
     return bus;
 }
 
@@ -104,6 +118,12 @@ std::vector<std::shared_ptr<StandInFileObject>> StandInInstrumentObject::Files()
 
 SimulatedInstrument& StandInInstrumentObject::Simulated() {
     return Bus().Instrument(name);
+}
+
+std::string StandInInstrumentObject::TakeTranscript() {
+    std::string transcript = Recorder().Text(TestControls::TranscriptBytes);
+    Recorder().Clear();
+    return transcript;
 }
 
 void StandInInstrumentObject::SetFaults(const std::string& plan) {

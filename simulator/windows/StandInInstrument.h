@@ -38,6 +38,7 @@ class StandInInstrumentObject final : public Platform::Drivers::EndpointCancelle
 
     SimulatedInstrument& Simulated();
     void SetFaults(const std::string& plan);
+    static std::string TakeTranscript();
     /// For good, from the next opening of a device that is not open.
     void UseElsewhere() { usedElsewhere = true; }
     bool IsUsedElsewhere() const { return usedElsewhere; }

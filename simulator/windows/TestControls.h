@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 /// Device controls by which a test reaches the instrument behind a stand-in driver, past the driver's own
@@ -20,6 +21,9 @@ inline constexpr std::uint32_t SetInterfaceVersion = Code(0x902);
 inline constexpr std::uint32_t UseElsewhere = Code(0x903);
 /// Output: the content of the EEPROM.
 inline constexpr std::uint32_t ReadEeprom = Code(0x904);
+/// Output: the transfers of all instruments since it was last asked for, as the text of a recorder.
+inline constexpr std::uint32_t TakeTranscript = Code(0x906);
+inline constexpr std::size_t TranscriptBytes = 16;  ///< of each transfer's data
 /// Output: `Counts`.
 inline constexpr std::uint32_t ReadCounts = Code(0x905);
 

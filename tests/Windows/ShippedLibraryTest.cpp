@@ -8,6 +8,7 @@
 #include <iterator>
 #include <memory>
 #include <set>
+#include <span>
 #include <sstream>
 #include <thread>
 
@@ -20,6 +21,7 @@
 #include "ShippedLibrary.h"
 #include "SimulatedBus.h"
 #include "StandInDriver.h"
+#include "TransferRecorder.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -94,16 +96,26 @@ std::string Shipped::usbIoDriver;
 std::string Shipped::tool;
 std::string Shipped::example;
 
-/// The first readout of the same instrument when everything is in this process.
-std::array<std::int32_t, OSTRA_READOUT_VALUES> ReadoutInProcess(std::uint64_t seed) {
+using Values = std::array<std::int32_t, OSTRA_READOUT_VALUES>;
+
+/// Runs an operation on the same instrument with everything in this process; gives what went over the wire.
+template <class Operation>
+std::string TranscriptInProcess(std::uint64_t seed, Operation operation) {
+    Simulator::TransferRecorder recorder;
     Simulator::SimulatedBus bus(Platform::ClockScheduler());
+    bus.WrapDevices([&](const std::string&, auto device) { return recorder.Record(std::move(device)); });
     Simulator::InstrumentSettings settings;
     settings.seed = seed;
     bus.Add("simulated", settings);
     const auto files = Platform::Drivers::MakeDriverFileSystem(bus);
     const Platform::ScopedDeviceFiles inForce(*files);
-    std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
-    Interface::TakeReadout(values, "");
+    operation();
+    return recorder.Text(Simulator::TestControls::TranscriptBytes);
+}
+
+Values ReadoutInProcess(std::uint64_t seed) {
+    Values values{};
+    TranscriptInProcess(seed, [&] { Interface::TakeReadout(values, ""); });
     return values;
 }
 
@@ -129,19 +141,28 @@ TEST_F(Shipped, WithoutInstrumentsThereIsNothingToSay) {
 
 TEST_F(Shipped, ReadoutIsTheSameAsInProcess) {
     const std::string path = driver->PlugIn();
+    Instrument(path).TakeTranscript();
     ASSERT_EQ(TakeReadout(""), OSTRA_OK) << library->LastError();
     EXPECT_EQ(library->LastError(), "");
     EXPECT_GT(std::set<std::int32_t>(library->values.begin(), library->values.end()).size(), 30U);
-    EXPECT_THAT(library->values, testing::ElementsAreArray(ReadoutInProcess(driver->SeedOf(path))));
+    Values values{};
+    const std::string transcript =
+        TranscriptInProcess(driver->SeedOf(path), [&] { Interface::TakeReadout(values, ""); });
+    EXPECT_THAT(library->values, testing::ElementsAreArray(values));
+    EXPECT_EQ(Instrument(path).TakeTranscript(), transcript);
     EXPECT_EQ(Instrument(path).Counts().measurements, 1U);
     EXPECT_EQ(Instrument(path).Counts().resets, 1U);
 }
 
 TEST_F(Shipped, ImageIsWritten) {
     const std::string path = driver->PlugIn();
+    Instrument(path).TakeTranscript();
     const std::vector<std::uint8_t> image = MakeImage(3);
     EXPECT_EQ(WriteImage(image, path), OSTRA_OK) << library->LastError();
     EXPECT_EQ(Instrument(path).Eeprom(), image);
+    EXPECT_EQ(Instrument(path).TakeTranscript(), TranscriptInProcess(driver->SeedOf(path), [&] {
+                  Interface::WriteImage(std::span<const std::uint8_t, OSTRA_IMAGE_SIZE>(image), "");
+              }));
 }
 
 TEST_F(Shipped, NamedInstrumentIsTaken) {

@@ -190,6 +190,13 @@ std::vector<BYTE> Instrument::Eeprom() {
     return content;
 }
 
+std::string Instrument::TakeTranscript() {
+    std::string transcript(1 << 16, '\0');
+    transcript.resize(
+        Control(Simulator::TestControls::TakeTranscript, nullptr, 0, transcript.data(), transcript.size()));
+    return transcript;
+}
+
 Simulator::TestControls::Counts Instrument::Counts() {
     Simulator::TestControls::Counts counts{};
     Control(Simulator::TestControls::ReadCounts, nullptr, 0, &counts, sizeof counts);

@@ -61,6 +61,7 @@ class Instrument final {
     void SetInterfaceVersion(WORD version);
     void UseElsewhere() { Control(Simulator::TestControls::UseElsewhere); }
     std::vector<BYTE> Eeprom();
+    std::string TakeTranscript();
     Simulator::TestControls::Counts Counts();
 
   private:
