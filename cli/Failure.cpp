@@ -9,6 +9,7 @@
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Platform/ErrorCodes.h"
 #include "Protocol/UsbIoDriver.h"
+#include "SystemCommands.h"
 #include "Utilities/Exceptions/Exceptions.h"
 
 namespace Varnholt::Cli {
@@ -29,17 +30,17 @@ constexpr const char* UnpluggedAdvice = "plug it in again; `ostra list` shows wh
 constexpr const char* InUseMessage = "the instrument is used by another process";
 constexpr const char* InUseAdvice = "end the other program: an instrument belongs to one process at a time";
 constexpr const char* NoPermissionMessage = "no permission to open the instrument";
-constexpr const char* NoPermissionAdvice = "`ostra doctor` names the reason and the fix";
 constexpr const char* SilentMessage = "the instrument did not answer in time";
 constexpr const char* SilentAdvice = "unplug it and plug it in again, then try once more";
 constexpr std::uint32_t AcquiredExclusively = 0xE0001020;
 constexpr std::uint32_t BusTimeout = 0xE0006000;
 
-constexpr std::array Meanings{
+const std::array Meanings{
     CodeMeaning{Errors::Busy, ExitCode::NotAvailable, InUseMessage, InUseAdvice},
     CodeMeaning{Status::OpenedByOtherProcess, ExitCode::NotAvailable, InUseMessage, InUseAdvice},
     CodeMeaning{AcquiredExclusively, ExitCode::NotAvailable, InUseMessage, InUseAdvice},
-    CodeMeaning{Errors::AccessDenied, ExitCode::NotAvailable, NoPermissionMessage, NoPermissionAdvice},
+    CodeMeaning{Errors::AccessDenied, ExitCode::NotAvailable, NoPermissionMessage,
+                SystemAdvice::NoPermission},
     CodeMeaning{Errors::FileNotFound, ExitCode::NoInstrument, UnpluggedMessage, UnpluggedAdvice},
     CodeMeaning{Errors::DeviceNotConnected, ExitCode::NoInstrument, UnpluggedMessage, UnpluggedAdvice},
     CodeMeaning{Status::DeviceRemoved, ExitCode::NoInstrument, UnpluggedMessage, UnpluggedAdvice},
@@ -80,8 +81,7 @@ FailureReport OfTransfer(const std::string& text) {
             }
         }
     }
-    return {ExitCode::InputOutput, WithReason("a transfer failed", text),
-            "try again; if it stays, `ostra doctor`"};
+    return {ExitCode::InputOutput, WithReason("a transfer failed", text), SystemAdvice::TransferFailed};
 }
 
 }  // namespace

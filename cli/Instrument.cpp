@@ -5,15 +5,13 @@
 
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
 #include "Holder.h"
+#include "SystemCommands.h"
 
 namespace Varnholt::Cli {
 namespace {
 
 using DeviceDriver::Ostra::USB::USBBrowser;
 using Utilities::Tools::SmartPointer;
-
-constexpr const char* AdviceWhenNoneIsFound =
-    "`ostra doctor` looks for the reason; `ostra-simulator` simulates an instrument";
 
 std::string Joined(const std::vector<std::string>& names) {
     std::string text;
@@ -51,7 +49,7 @@ std::string ShortNameOf(const std::string& identifier) {
 
 std::size_t FindInstrument(const std::vector<std::string>& identifiers, const std::string& name) {
     if (identifiers.empty()) {
-        throw ToolFailure(ExitCode::NoInstrument, "no instrument is connected", AdviceWhenNoneIsFound);
+        throw ToolFailure(ExitCode::NoInstrument, "no instrument is connected", SystemAdvice::NoneIsFound);
     }
     if (name.empty()) {
         return 0;

@@ -12,6 +12,13 @@ class Session;
 /// Adds the commands that only this platform has.
 void AddSystemCommands(CommandSpec app, Session& session);
 
+/// What the user can do next with this platform's means.
+namespace SystemAdvice {
+extern const char* const NoneIsFound;
+extern const char* const NoPermission;
+extern const char* const TransferFailed;
+}  // namespace SystemAdvice
+
 /// Prints the devices that could be instruments, as a table or JSON (--candidates of the list command).
 void PrintCandidates(Session& session, bool json);
 

@@ -40,6 +40,13 @@ std::unique_ptr<TrafficRecording> RecordTraffic(const std::string& file) {
     return std::make_unique<BusRecording>(file);
 }
 
+namespace SystemAdvice {
+const char* const NoneIsFound =
+    "`ostra doctor` looks for the reason; `ostra-simulator` simulates an instrument";
+const char* const NoPermission = "`ostra doctor` names the reason and the fix";
+const char* const TransferFailed = "try again; if it stays, `ostra doctor`";
+}  // namespace SystemAdvice
+
 void AddSystemCommands(CommandSpec app, Session& session) {
     AddRegister(app, session);
     AddDoctor(app, session);

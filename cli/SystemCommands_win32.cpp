@@ -3,6 +3,12 @@
 
 namespace Varnholt::Cli {
 
+namespace SystemAdvice {
+const char* const NoneIsFound = "the device manager shows whether it is plugged in and has its driver";
+const char* const NoPermission = "end other programs that use it, or ask an administrator";
+const char* const TransferFailed = "try again; if it stays, unplug the instrument and plug it in again";
+}  // namespace SystemAdvice
+
 void AddSystemCommands(CommandSpec, Session&) {}
 
 void PrintCandidates(Session&, bool) {
