@@ -12,8 +12,8 @@ namespace Varnholt::Platform::Drivers {
 /// the pipes below it. Every file has a share in the claim to the device.
 ///
 /// Requests of a kind that the file does not take end with `Errors::InvalidFunction`. The driver clears the
-/// halt of an endpoint before the next transfer on it. A read of no bytes completes at once and reaches no
-/// endpoint; a write of no bytes is sent as an empty packet.
+/// halt of an endpoint before the next transfer on it, or with the last file. A read of no bytes completes at
+/// once and reaches no endpoint; a write of no bytes is sent as an empty packet.
 class NativeDriverFile final : public DriverFile {
   public:
     /// Claims the device. Null on failure with the code in `error`; `Errors::FileNotFound` where the device

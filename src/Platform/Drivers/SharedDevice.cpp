@@ -7,9 +7,12 @@
 namespace Varnholt::Platform::Drivers {
 namespace {
 
+constexpr unsigned InDirection = 0x80;
+constexpr unsigned EndpointsOfADirection = 16;
+
 std::uint32_t BitOf(std::uint8_t endpoint) {
-    const unsigned direction = (endpoint & 0x80U) != 0 ? 16 : 0;
-    return 1U << ((endpoint & 0x0FU) + direction);
+    const unsigned direction = (endpoint & InDirection) != 0 ? EndpointsOfADirection : 0;
+    return 1U << (endpoint % EndpointsOfADirection + direction);
 }
 
 }  // namespace
@@ -40,6 +43,7 @@ ErrorCode SharedDevice::Claim() {
 void SharedDevice::Unclaim() {
     const CriticalSection::Holder holder(setup);
     if (claims > 0 && --claims == 0) {
+        ClearHalts();
         opened->Release();
     }
 }
@@ -88,6 +92,26 @@ void SharedDevice::Learn(const Usb::Transfer& transfer) {
 ErrorCode SharedDevice::ClearHalt(std::uint8_t endpoint) {
     // Whoever comes second must not pass before the first has cleared the halt, or its transfer stalls again.
     const CriticalSection::Holder holder(setup);
+    return ClearHaltOf(endpoint);
+}
+
+/// A halt outlives the claim, and whoever comes next knows nothing of it. A device that does not take this
+/// cannot be helped.
+void SharedDevice::ClearHalts() noexcept {
+    for (unsigned number = 1; number < EndpointsOfADirection; ++number) {
+        for (const unsigned direction : {0U, InDirection}) {
+            try {
+                if (!IsGone()) {
+                    ClearHaltOf(static_cast<std::uint8_t>(number | direction));
+                }
+            } catch (...) {
+                return;
+            }
+        }
+    }
+}
+
+ErrorCode SharedDevice::ClearHaltOf(std::uint8_t endpoint) {
     if ((halted.load(std::memory_order_acquire) & BitOf(endpoint)) == 0) {
         return Errors::Success;
     }

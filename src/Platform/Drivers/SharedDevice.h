@@ -20,7 +20,8 @@ class SharedDevice final {
 
     /// Takes a share in the claim to the USB device; the first one opens and claims it. May block.
     ErrorCode Claim();
-    /// Gives one share back; the last releases the device, which stays open.
+    /// Gives one share back; the last clears what is halted and releases the device, which stays open. May
+    /// block.
     void Unclaim();
     bool IsClaimed();
     /// Whether the device, once claimed, has this endpoint.
@@ -37,6 +38,9 @@ class SharedDevice final {
 
   private:
     ErrorCode ClearHalt(std::uint8_t endpoint);
+    /// With `setup` held:
+    ErrorCode ClearHaltOf(std::uint8_t endpoint);
+    void ClearHalts() noexcept;
     ErrorCode Note(ErrorCode code);
 
     Usb::UsbBus& bus;

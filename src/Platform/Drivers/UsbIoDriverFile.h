@@ -15,8 +15,8 @@ namespace Varnholt::Platform::Drivers {
 ///
 /// A vendor request needs a claimed device, not a bound pipe. A read of no bytes completes at once and
 /// reaches no endpoint; a write of no bytes is sent as an empty packet. The driver clears the halt of an
-/// endpoint before the next transfer on it. Once the device is known to be gone every control but the driver
-/// information ends with `Status::DeviceRemoved`.
+/// endpoint before the next transfer on it, or with the last claim. Once the device is known to be gone every
+/// control but the driver information ends with `Status::DeviceRemoved`.
 class UsbIoDriverFile final : public DriverFile {
   public:
     UsbIoDriverFile(std::shared_ptr<UsbIoDevice> usbIoDevice, EndpointCanceller& endpointCanceller);

@@ -232,7 +232,7 @@ TEST_F(NativeDriver, HasACodeForEveryOutcome) {
     }
 }
 
-TEST_F(NativeDriver, ClearsAHaltBeforeTheNextTransferOnly) {
+TEST_F(NativeDriver, ClearsAHaltBeforeTheNextTransferOrTheEnd) {
     device->Expect({
         BulkOut({1}),
         BulkIn(8, {}).Ends(TransferStatus::Stalled),
@@ -243,6 +243,8 @@ TEST_F(NativeDriver, ClearsAHaltBeforeTheNextTransferOnly) {
         HaltCleared(Protocol::BulkInEndpoint),
         BulkIn(8, Counting(8)),
         BulkIn(8, Counting(8)),
+        BulkIn(8, {}).Ends(TransferStatus::Stalled),
+        HaltCleared(Protocol::BulkInEndpoint),
     });
     const auto main = Open("native/port1");
     const auto readPipe = OpenPipe(Native::ReadPipe);
@@ -257,6 +259,10 @@ TEST_F(NativeDriver, ClearsAHaltBeforeTheNextTransferOnly) {
     EXPECT_EQ(Read(readPipe, buffer), (Outcome{Errors::GeneralFailure, 0})) << "still halted";
     EXPECT_EQ(Read(readPipe, buffer), (Outcome{0, 8}));
     EXPECT_EQ(Read(readPipe, buffer), (Outcome{0, 8}));
+    EXPECT_EQ(Read(readPipe, buffer), (Outcome{Errors::GeneralFailure, 0}));
+    for (const Platform::Handle file : {main, readPipe, writePipe}) {
+        EXPECT_TRUE(files->CloseFile(file));
+    }
 }
 
 }  // namespace
