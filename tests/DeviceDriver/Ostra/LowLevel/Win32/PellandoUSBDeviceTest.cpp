@@ -169,24 +169,23 @@ TEST_F(NativeDevice, TakesTheDeviceLockForEveryTransfer) {
         SleepMilliseconds(100);
         EXPECT_FALSE(other.HasEnded());
         mutex.Unlock();
-        SleepMilliseconds(100);
-        EXPECT_TRUE(other.HasEnded());
+        WaitUntil([&] { return other.HasEnded(); });
     }
 }
 
 TEST_F(NativeDevice, HoldsTheDeviceLockThroughAStrip) {
     auto device = Open();
-    driver.Script(1, {.data = Counting(10, 1), .after = 50});
-    driver.Script(1, {.after = 100});
+    driver.Script(1, {.data = Counting(10, 1), .after = 500});
+    driver.Script(1, {.after = 1000});
     BackgroundThread scan([&] {
         ScanRecordList records;
         device->ReadDataStrip(records, 5, 0);
         EXPECT_THAT(records, SizeIs(2));
     });
-    SleepMilliseconds(10);
+    WaitUntil([&] { return driver.Running(1) == 2; });
     Mutex mutex("native1");
-    EXPECT_FALSE(mutex.TryLock(60));
-    EXPECT_TRUE(mutex.TryLock(1000));
+    ASSERT_FALSE(mutex.TryLock(600));
+    EXPECT_TRUE(mutex.TryLock(3000));
     mutex.Unlock();
 }
 
