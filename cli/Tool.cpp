@@ -31,6 +31,7 @@ Exit codes:
 
 void BuildCommandLine(CLI::App& app, Session& session) {
     app.require_subcommand(1);
+    app.fallthrough();  // what stands before the command may stand behind it as well
     app.set_version_flag("--version", "ostra " OSTRA_VERSION, "print the version");
     app.set_help_flag("-h,--help", "print this help");
     static std::string captureFile;  // read by `CaptureFileIn`; here for the help
@@ -57,6 +58,12 @@ FailureReport ReportOf(const CLI::App& app, const CLI::ParseError& error) {
         name += " " + command->get_name();
     }
     std::string message = error.what();
+    if (error.get_exit_code() == static_cast<int>(CLI::ExitCodes::ExtrasError)) {
+        message = "not expected here:";  // the parser's own text has them backwards
+        for (const std::string& extra : app.remaining(true)) {
+            message += " " + extra;
+        }
+    }
     if (!command->get_subcommands({}).empty()) {
         // The parser only misses a command where there is one that it does not know.
         const std::vector<std::string> unknown = command->remaining();

@@ -30,7 +30,8 @@ void Show(Session& session, const ShowOptions& options) {
         return;
     }
     if (!copies.main.isValid) {
-        session.Warn("the main copy of the log is damaged; this is " + std::string(copies.Used()));
+        session.Warn(std::string("the main copy of the log is damaged; the driver uses ") +
+                     (copies.second.isValid ? "the " : "") + copies.Used());
     }
     PrintValues(session, model.Log(), options.numbers ? Vectors::Numbers : Vectors::Plotted);
 }

@@ -177,8 +177,9 @@ void Scan(Session& session, const Options& options) {
                        {"file", options.output}});
     } else {
         const double rate = seconds > 0 ? static_cast<double>(writer.Bytes()) / seconds : 0;
-        session.Note(fmt::format("{} records of {} bytes in {:.3f} s{}{}", writer.Records(),
-                                 options.recordSize, seconds, rate > 0 ? ", " + SizeText(rate) + "/s" : "",
+        session.Note(fmt::format("{} record{} of {} bytes in {:.3f} s{}{}", writer.Records(),
+                                 writer.Records() == 1 ? "" : "s", options.recordSize, seconds,
+                                 rate > 0 ? ", " + SizeText(rate) + "/s" : "",
                                  file ? ", written to " + options.output : ""));
     }
 }

@@ -293,6 +293,8 @@ TEST(CommandLineTest, UsageErrorsGoToStandardError) {
     }
     tool.Run({"no-such-command"});
     EXPECT_NE(tool.Err().find("`ostra` has no command 'no-such-command'"), std::string::npos) << tool.Err();
+    tool.Run({"readout", "one", "two"});
+    EXPECT_NE(tool.Err().find("one two"), std::string::npos) << tool.Err();
     tool.Run({"eeprom"});
     EXPECT_NE(tool.Err().find("`ostra eeprom --help`"), std::string::npos) << tool.Err();
     EXPECT_EQ(tool.Run({"--help"}), ExitCode::Success);
