@@ -72,7 +72,7 @@ function(ostra_test NAME)
     target_compile_options(${NAME} PRIVATE -O0)  # what is tested is optimised; its tests had better compile fast
   endif()
   add_test(NAME ${NAME} COMMAND ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:${NAME}>)
-  set_tests_properties(${NAME} PROPERTIES TIMEOUT 300 SKIP_RETURN_CODE 77)
+  set_tests_properties(${NAME} PROPERTIES TIMEOUT 500 SKIP_RETURN_CODE 77)
   if(WIN32)
     # Each test has a Windows of its own, so none waits for another.
     if(ARG_EXACT_TIME)
