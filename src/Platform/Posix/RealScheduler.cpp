@@ -1,5 +1,7 @@
 #include "Platform/Posix/RealScheduler.h"
 
+#include <sys/prctl.h>
+
 #include <algorithm>
 #include <atomic>
 #include <chrono>
@@ -77,6 +79,9 @@ void RealScheduler::StartThread() {
 }
 
 void* RealScheduler::RunThread(void* scheduler) {
+    // Events are for their time, not for up to 50 us later.
+    constexpr unsigned long ExactTimers = 1;
+    prctl(PR_SET_TIMERSLACK, ExactTimers);
     static_cast<RealScheduler*>(scheduler)->CallEvents();
     return nullptr;
 }
