@@ -43,8 +43,6 @@ class InterruptListener final {
   private:
     class Watch;
 
-    static std::uint32_t ThreadEntry(void* argument);
-
     const std::shared_ptr<Watch> watch;
     Platform::OwnedHandle thread;  ///< of the owner's thread only
 };

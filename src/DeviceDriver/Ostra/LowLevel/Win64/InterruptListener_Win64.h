@@ -47,8 +47,6 @@ class InterruptListener_Win64 final {
   private:
     class Watch;
 
-    static std::uint32_t ThreadEntry(void* argument);
-
     const std::shared_ptr<Watch> watch;
     Platform::OwnedHandle thread;  ///< of the owner's thread only
     Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe> pipe;
