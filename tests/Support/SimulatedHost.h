@@ -8,14 +8,9 @@
 #include "Platform/EventScheduler.h"
 #include "Platform/HostQueries.h"
 #include "SimulatedBus.h"
+#include "Support/Transport.h"
 
 namespace Varnholt::Tests {
-
-enum class Transport { Native, UsbIo };
-
-inline const char* Name(Transport transport) {
-    return transport == Transport::Native ? "native" : "usbio";
-}
 
 /// A host with simulated instruments on its bus: the library's device files are those of the driver behaviour
 /// over the bus, and the host answers the 64-bit question so that the library uses the given transport.

@@ -1,12 +1,6 @@
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-
-#include <vector>
-
 #include "Platform/CallFilter.h"
 #include "Protocol/Instrument.h"
-#include "Support/ScriptedUsbIo.h"
-#include "Support/TestClock.h"
+#include "Support/DriverTest.h"
 #include "UsbIo/CUsbIoPipe.h"
 #include "UsbIo/ScopedDeviceList.h"
 
@@ -17,23 +11,25 @@ using namespace Protocol::UsbIoDriver;
 using namespace Protocol;
 using testing::Each;
 using testing::ElementsAre;
-using Tests::ScriptedUsbIo;
-using Tests::UsbIoAnswer;
+using Tests::Answer;
+using Tests::Never;
+using Tests::ScriptedDriver;
 
-constexpr std::uint32_t Never = UsbIoAnswer::Never;
 constexpr std::uint32_t Pending = Platform::Errors::IoPending;
 
-class CUsbIoPipeTest : public testing::Test {
+class CUsbIoPipeTest : public Tests::DriverTest {
   protected:
     void SetUp() override {
         const ScopedDeviceList list(InterfaceClass);
         ASSERT_EQ(pipe.Bind(0, BulkInEndpoint, list.Get(), &InterfaceClass), Status::Success);
         driver.TakeTranscript();
     }
+    /// Starts a read that fills the buffer.
+    void StartRead(CUsbIoBuffer& buffer) {
+        buffer.NumberOfBytesToTransfer = buffer.Size;
+        ASSERT_TRUE(pipe.Read(buffer));
+    }
 
-    Tests::TestClock clock{Tests::TestTime::RealForThreadSanitizer};
-    ScriptedUsbIo driver;
-    Platform::ScopedDeviceFiles files{driver};
     CUsbIoPipe pipe;
 };
 
@@ -50,7 +46,7 @@ TEST_F(CUsbIoPipeTest, BindOpensOnlyAClosedPipe) {
 TEST_F(CUsbIoPipeTest, ReadSyncReportsStatusAndBytesMoved) {
     struct Case {
         const char* name;
-        UsbIoAnswer answer;
+        Answer answer;
         std::uint32_t timeout;
         std::uint32_t status;
         std::uint32_t moved;
@@ -61,7 +57,7 @@ TEST_F(CUsbIoPipeTest, ReadSyncReportsStatusAndBytesMoved) {
         {"later", {.data = data, .after = 50}, 100, 0, 4},
         {"short", {.data = {1}, .after = 5}, Platform::Infinite, 0, 1},
         {"empty", {.after = 5}, 100, 0, 0},
-        {"refused", {.code = 6, .refused = true}, 100, 6, 0},
+        {"refused", {.refusal = 6}, 100, 6, 0},
         {"fails at once", {.code = Status::NotBound}, 100, Status::NotBound, 0},
         {"fails later with data",
          {.data = {1, 2}, .code = Status::EndpointHalted, .after = 5},
@@ -76,11 +72,11 @@ TEST_F(CUsbIoPipeTest, ReadSyncReportsStatusAndBytesMoved) {
          Status::TimedOut,
          3},
         {"completed against the cancellation",
-         {.data = data, .after = Never, .cancelledAfter = 30, .cancelledCode = 0, .cancelledWithData = true},
+         {.data = data, .after = Never, .cancelledAfter = 30, .cancelledWith = 0, .cancelledWithData = true},
          100,
          Status::TimedOut,
          4},
-        {"more than there is room for", {.data = data, .reportedCount = 99}, 100, 0, 4},
+        {"more than there is room for", {.data = data, .count = 99}, 100, 0, 4},
         {"not waited for", {.data = data, .after = Never}, 0, Status::TimedOut, 0},
     };
     for (const Case& row : cases) {
@@ -123,8 +119,7 @@ TEST_F(CUsbIoPipeTest, AnEventEndsTheWaitButNotTheTransfer) {
     const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
     driver.Script(BulkInEndpoint, {.data = {5}, .after = 80});
     CUsbIoBuffer buffer(8);
-    buffer.NumberOfBytesToTransfer = 8;
-    ASSERT_TRUE(pipe.Read(buffer));
+    StartRead(buffer);
     EXPECT_EQ(buffer.Status, Pending);
     EXPECT_EQ(pipe.WaitForCompletion(buffer, 0), Status::TimedOut);
     EXPECT_EQ(pipe.WaitForCompletion(buffer, 20, event.Get()), Status::TimedOut);
@@ -139,8 +134,7 @@ TEST_F(CUsbIoPipeTest, AnEventEndsTheWaitButNotTheTransfer) {
 TEST_F(CUsbIoPipeTest, AWaitThatThePlatformRefusesIsPassedOn) {
     driver.Script(BulkInEndpoint, {.after = Never});
     CUsbIoBuffer buffer(8);
-    buffer.NumberOfBytesToTransfer = 8;
-    ASSERT_TRUE(pipe.Read(buffer));
+    StartRead(buffer);
     char noHandle = 0;
     EXPECT_EQ(pipe.WaitForCompletion(buffer, 10, &noHandle), 0xFFFFFFFF);
     EXPECT_EQ(buffer.Status, Pending);
@@ -169,8 +163,7 @@ TEST_F(CUsbIoPipeTest, ABufferOutlivesItsTransfer) {
                   {.data = {1, 2}, .after = Never, .cancelledAfter = 40, .cancelledWithData = true});
     {
         CUsbIoBuffer buffer(2);
-        buffer.NumberOfBytesToTransfer = 2;
-        ASSERT_TRUE(pipe.Read(buffer));
+        StartRead(buffer);
     }
     EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
 }
@@ -178,11 +171,9 @@ TEST_F(CUsbIoPipeTest, ABufferOutlivesItsTransfer) {
 TEST_F(CUsbIoPipeTest, TransfersOfOnePipeOverlap) {
     driver.Script(BulkInEndpoint, {.data = {1}, .after = 20});
     driver.Script(BulkInEndpoint, {.data = {2, 3}, .after = 30});
-    CUsbIoBuffer first(4);
-    CUsbIoBuffer second(4);
-    first.NumberOfBytesToTransfer = second.NumberOfBytesToTransfer = 4;
-    ASSERT_TRUE(pipe.Read(first));
-    ASSERT_TRUE(pipe.Read(second));
+    CUsbIoBuffer first(4), second(4);
+    StartRead(first);
+    StartRead(second);
     EXPECT_EQ(driver.Running(BulkInEndpoint), 2U);
     EXPECT_EQ(pipe.WaitForCompletion(second, 1000), Status::Success);
     EXPECT_EQ(pipe.WaitForCompletion(first, 1000), Status::Success);
@@ -195,7 +186,7 @@ TEST(CUsbIoPipeRace, NoByteIsLostOrCountedTwiceWhenATimeOutMeetsACompletion) {
     std::uint32_t rounds = 0;
     for (std::uint64_t seed = 1; seed <= Tests::TestClock::SeedsToTry; ++seed) {
         const Tests::TestClock clock(Tests::TestTime::RealForThreadSanitizer, seed);
-        ScriptedUsbIo driver;
+        ScriptedDriver driver;
         const Platform::ScopedDeviceFiles files(driver);
         CUsbIoPipe pipe;
         ASSERT_EQ(pipe.Bind(0, BulkInEndpoint, nullptr, nullptr), Status::Success);
@@ -205,7 +196,7 @@ TEST(CUsbIoPipeRace, NoByteIsLostOrCountedTwiceWhenATimeOutMeetsACompletion) {
                           {.data = {1, 2, 3},
                            .after = 4 + i % 3,
                            .cancelledAfter = i % 4,
-                           .cancelledCode = i % 7 == 0 ? 0 : Platform::Errors::OperationAborted,
+                           .cancelledWith = i % 7 == 0 ? 0 : Platform::Errors::OperationAborted,
                            .cancelledWithData = i % 5 == 0});
             std::vector<std::uint8_t> buffer(3);
             std::uint32_t size = 3;

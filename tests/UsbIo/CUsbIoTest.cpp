@@ -1,13 +1,8 @@
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-
 #include <array>
 #include <string>
 
 #include "Platform/CallFilter.h"
-#include "Platform/Threads.h"
-#include "Support/ScriptedUsbIo.h"
-#include "Support/TestClock.h"
+#include "Support/DriverTest.h"
 #include "UsbIo/CUsbIo.h"
 #include "UsbIo/ScopedDeviceList.h"
 
@@ -19,7 +14,7 @@ using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::IsEmpty;
 using testing::Not;
-using Tests::ScriptedUsbIo;
+using Tests::ScriptedDriver;
 
 TEST(CUsbIoErrorText, TextsAreThoseOfTheTable) {
     const std::vector<std::pair<std::uint32_t, const char*>> cases{
@@ -54,16 +49,14 @@ TEST(CUsbIoErrorText, IsCutToTheBuffer) {
     EXPECT_EQ(CUsbIo::ErrorText(nullptr, 10, 0), nullptr);
 }
 
-class CUsbIoTest : public testing::Test {
+class CUsbIoTest : public Tests::DriverTest {
   protected:
+    CUsbIoTest() : DriverTest(Tests::TestTime::RealForThreadSanitizer, {"usbio/1", "usbio/2"}) {}
+
     std::uint32_t Open(CUsbIo& device, int number = 0) {
         const ScopedDeviceList list(InterfaceClass);
         return device.Open(number, list.Get(), &InterfaceClass);
     }
-
-    Tests::TestClock clock{Tests::TestTime::RealForThreadSanitizer};
-    ScriptedUsbIo driver{{"usbio/1", "usbio/2"}};
-    Platform::ScopedDeviceFiles files{driver};
 };
 
 TEST_F(CUsbIoTest, OpensByListAndByNumber) {
@@ -97,8 +90,8 @@ TEST_F(CUsbIoTest, AcceptsInterfaceVersions2From30On) {
         {0x3002, Status::VersionMismatch},
     };
     for (const auto& [version, expected] : cases) {
-        driver.ScriptControl(Control::GetDriverInfo, {.data = {static_cast<std::uint8_t>(version),
-                                                               static_cast<std::uint8_t>(version >> 8)}});
+        driver.Script(Control::GetDriverInfo, {.data = {static_cast<std::uint8_t>(version),
+                                                        static_cast<std::uint8_t>(version >> 8)}});
         CUsbIo device;
         EXPECT_EQ(Open(device), expected) << std::hex << version;
         EXPECT_EQ(driver.OpenFiles(), expected == 0 ? 1U : 0U);
@@ -123,9 +116,8 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
         {"file not found", 0, [&] { driver.RefuseOpen("usbio/1", 2); }, Status::DeviceNotFound},
         {"file refused", 0, [&] { driver.RefuseOpen("usbio/1", 5); }, 5},
         {"no event", 1, [&] { failing("MakeAutoResetEvent", 8); }, Status::NoMemory},
-        {"driver refuses", 1, [&] { driver.ScriptControl(Control::GetDriverInfo, {.code = 31, .after = 5}); },
-         31},
-        {"driver tells nothing", 1, [&] { driver.ScriptControl(Control::GetDriverInfo, {}); },
+        {"driver refuses", 1, [&] { driver.Script(Control::GetDriverInfo, {.code = 31, .after = 5}); }, 31},
+        {"driver tells nothing", 1, [&] { driver.Script(Control::GetDriverInfo, {}); },
          Status::VersionMismatch},
     };
     for (const Case& row : cases) {
@@ -189,7 +181,7 @@ TEST_F(CUsbIoTest, SendsTheDriversRecords) {
     std::uint32_t length = data.size();
     EXPECT_EQ(device.ClassOrVendorOutRequest(data.data(), length, request), 0U);
     EXPECT_EQ(length, 3U);
-    driver.ScriptControl(Control::ClassOrVendorInRequest, {.data = {9, 8}, .after = 3});
+    driver.Script(Control::ClassOrVendorInRequest, {.data = {9, 8}, .after = 3});
     EXPECT_EQ(device.ClassOrVendorInRequest(data.data(), length, request), 0U);
     EXPECT_EQ(length, 2U);
     EXPECT_THAT(data, ElementsAre(9, 8, 3));
@@ -215,14 +207,14 @@ TEST_F(CUsbIoTest, SendsTheDriversRecords) {
 TEST_F(CUsbIoTest, ControlsReportHowTheyEnd) {
     struct Case {
         const char* name;
-        Tests::UsbIoAnswer answer;
+        Tests::Answer answer;
         std::uint32_t status;
         std::uint32_t moved;
     };
     const std::vector<Case> cases{
         {"at once", {.data = {1, 2}}, 0, 2},
         {"later", {.data = {1}, .after = 20}, 0, 1},
-        {"refused", {.code = 170, .refused = true}, 170, 0},
+        {"refused", {.refusal = 170}, 170, 0},
         {"fails at once", {.code = Status::NotConfigured}, Status::NotConfigured, 0},
         {"fails later with data",
          {.data = {1, 2, 3}, .code = Status::DeviceRemoved, .after = 20},
@@ -232,7 +224,7 @@ TEST_F(CUsbIoTest, ControlsReportHowTheyEnd) {
     CUsbIo device;
     ASSERT_EQ(Open(device), Status::Success);
     for (const Case& row : cases) {
-        driver.ScriptControl(Control::ClassOrVendorInRequest, row.answer);
+        driver.Script(Control::ClassOrVendorInRequest, row.answer);
         std::array<std::uint8_t, 4> data{};
         std::uint32_t length = data.size();
         EXPECT_EQ(device.ClassOrVendorInRequest(data.data(), length, {}), row.status) << row.name;
@@ -245,17 +237,17 @@ TEST_F(CUsbIoTest, ControlsOfSeveralThreadsRunOneAtATime) {
     ASSERT_EQ(Open(device), Status::Success);
     constexpr int Each = 5;
     for (int i = 0; i < 2 * Each; ++i) {
-        driver.ScriptControl(Control::UnconfigureDevice, {.after = 2});
+        driver.Script(Control::UnconfigureDevice, {.after = 2});
     }
-    const auto work = [](void* argument) -> std::uint32_t {
+    const auto work = [&] {
         for (int i = 0; i < Each; ++i) {
-            EXPECT_EQ(static_cast<CUsbIo*>(argument)->UnconfigureDevice(), 0U);
+            EXPECT_EQ(device.UnconfigureDevice(), 0U);
         }
-        return 0;
     };
-    const Platform::OwnedHandle other(Platform::StartThread(work, &device));
-    work(&device);
-    EXPECT_EQ(Platform::Wait(other.Get(), 10000), Platform::WaitResult::Signalled);
+    {
+        const Tests::BackgroundThread other(work);
+        work();
+    }
     EXPECT_EQ(driver.MostControlsAtOnce(), 1U);
 }
 

@@ -1,15 +1,8 @@
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-
 #include <algorithm>
 #include <atomic>
-#include <functional>
-#include <mutex>
-#include <vector>
 
 #include "Protocol/Instrument.h"
-#include "Support/ScriptedUsbIo.h"
-#include "Support/TestClock.h"
+#include "Support/DriverTest.h"
 #include "UsbIo/CUsbIoReader.h"
 #include "UsbIo/CUsbIoWriter.h"
 #include "UsbIo/ScopedDeviceList.h"
@@ -20,12 +13,11 @@ namespace {
 using namespace Protocol::UsbIoDriver;
 using Protocol::BulkInEndpoint;
 using Protocol::BulkOutEndpoint;
-using testing::ElementsAre;
 using testing::ElementsAreArray;
-using testing::IsEmpty;
-using Tests::ScriptedUsbIo;
+using Tests::Lines;
+using Tests::Never;
+using Tests::WaitUntil;
 
-constexpr std::uint32_t Never = Tests::UsbIoAnswer::Never;
 constexpr std::uint32_t Limit = 10000;
 
 /// Collects what it reads; tells when its thread is through.
@@ -97,7 +89,7 @@ class Writer final : public CUsbIoWriter {
     std::uint8_t sent = 0;
 };
 
-class CUsbIoThreadTest : public testing::Test {
+class CUsbIoThreadTest : public Tests::DriverTest {
   protected:
     template <class Stream>
     void Bind(Stream& stream, std::uint8_t endpoint) {
@@ -105,10 +97,6 @@ class CUsbIoThreadTest : public testing::Test {
         ASSERT_EQ(stream.Bind(0, endpoint, list.Get(), &InterfaceClass), Status::Success);
         driver.TakeTranscript();
     }
-
-    Tests::TestClock clock{Tests::TestTime::RealForThreadSanitizer};
-    ScriptedUsbIo driver;
-    Platform::ScopedDeviceFiles files{driver};
 };
 
 TEST_F(CUsbIoThreadTest, ReadsAStreamInOrder) {
@@ -138,9 +126,7 @@ TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
     reader.onCompleted = [&] { Platform::SignalEvent(completed.Get()); };
     ASSERT_TRUE(reader.StartThread());
     ASSERT_EQ(Platform::Wait(completed.Get(), Limit), Platform::WaitResult::Signalled);
-    while (driver.Running(BulkInEndpoint) < 4) {
-        Platform::SleepMilliseconds(1);
-    }
+    WaitUntil([&] { return driver.Running(BulkInEndpoint) == 4; });
     reader.onCompleted = {};
     const Tests::Stopwatch stopwatch(clock);
     EXPECT_TRUE(reader.ShutdownThread());
@@ -189,7 +175,7 @@ TEST_F(CUsbIoThreadTest, AReadStartedBehindTheAbortDoesNotHoldUpTheEnd) {
                                        Platform::Wait(aborted.Get(), Limit);
                                        Platform::SleepMilliseconds(20);
                                    }});
-    driver.ScriptControl(Control::AbortPipe, {.onStart = [&] { Platform::SignalEvent(aborted.Get()); }});
+    driver.Script(Control::AbortPipe, {.onStart = [&] { Platform::SignalEvent(aborted.Get()); }});
     ASSERT_TRUE(reader.AllocateBuffers(8, 2));
     ASSERT_TRUE(reader.StartThread());
     ASSERT_EQ(Platform::Wait(started.Get(), Limit), Platform::WaitResult::Signalled);
@@ -218,37 +204,27 @@ TEST_F(CUsbIoThreadTest, SomethingThrownEndsTheThread) {
     reader.onCompleted = [] { throw 7; };
     ASSERT_TRUE(reader.AllocateBuffers(8, 3));
     ASSERT_TRUE(reader.StartThread());
-    while (reader.Received().empty() || driver.Running(BulkInEndpoint) > 0) {
-        Platform::SleepMilliseconds(1);
-    }
+    WaitUntil([&] { return !reader.Received().empty() && driver.Running(BulkInEndpoint) == 0; });
     EXPECT_TRUE(reader.ShutdownThread());
 }
 
 TEST_F(CUsbIoThreadTest, WritesUntilFinished) {
-    Writer writer;
-    Bind(writer, BulkOutEndpoint);
-    for (int i = 0; i < 4; ++i) {
-        driver.Script(BulkOutEndpoint, {.after = 2});
+    const Lines all{"write 3 01", "write 3 02", "write 3 03", "write 3 04"};
+    for (const std::uint8_t count : {std::uint8_t{4}, std::uint8_t{0}}) {
+        Writer writer;
+        Bind(writer, BulkOutEndpoint);
+        for (int i = 0; i < count; ++i) {
+            driver.Script(BulkOutEndpoint, {.after = 2});
+        }
+        writer.writesWanted = count;
+        ASSERT_TRUE(writer.AllocateBuffers(2, 3));
+        ASSERT_TRUE(writer.StartThread());
+        EXPECT_TRUE(writer.WaitForExit());
+        EXPECT_EQ(driver.TakeTranscript(), Lines(all.begin(), all.begin() + count));
+        EXPECT_TRUE(writer.ShutdownThread());
+        EXPECT_EQ(writer.completed, 0);
+        EXPECT_EQ(driver.Running(BulkOutEndpoint), 0U);
     }
-    writer.writesWanted = 4;
-    ASSERT_TRUE(writer.AllocateBuffers(2, 3));
-    ASSERT_TRUE(writer.StartThread());
-    EXPECT_TRUE(writer.WaitForExit());
-    EXPECT_THAT(driver.TakeTranscript(),
-                ElementsAre("write 03 01", "write 03 02", "write 03 03", "write 03 04"));
-    EXPECT_TRUE(writer.ShutdownThread());
-    EXPECT_EQ(writer.completed, 0);
-    EXPECT_EQ(driver.Running(BulkOutEndpoint), 0U);
-}
-
-TEST_F(CUsbIoThreadTest, AWriterThatIsFinishedAtOnceSendsNothing) {
-    Writer writer;
-    Bind(writer, BulkOutEndpoint);
-    ASSERT_TRUE(writer.AllocateBuffers(2, 3));
-    ASSERT_TRUE(writer.StartThread());
-    EXPECT_TRUE(writer.WaitForExit());
-    EXPECT_THAT(driver.TakeTranscript(), IsEmpty());
-    EXPECT_TRUE(writer.ShutdownThread());
 }
 
 TEST(CUsbIoThreadRace, AThreadThatEndedByItselfCanBeStartedAgain) {

@@ -19,7 +19,6 @@ using testing::IsEmpty;
 using testing::SizeIs;
 using Varnholt::Utilities::Multithreading::Mutex;
 using Varnholt::Utilities::Multithreading::ScopedLock;
-using Lines = std::vector<std::string>;
 
 constexpr std::uint32_t Button = 20011;
 constexpr std::uint32_t Gone = 20010;
@@ -137,14 +136,6 @@ TEST_F(NativeDevice, KeepsItsPipesOpenWithoutAListener) {
         EXPECT_NO_THROW(ReadOneByte(device));
     }
     EXPECT_THAT(listener.Codes(), IsEmpty());
-}
-
-TEST_F(NativeDevice, PassesMessagesOn) {
-    auto device = Open();
-    device->MessageFromDevice(4711, 0);
-    EXPECT_THAT(listener.Codes(), ElementsAre(4711u));
-    driver.Script(1, {.data = {7}});
-    EXPECT_NO_THROW(ReadOneByte(*device)) << "only the end of the instrument closes its pipes";
 }
 
 /// Whoever holds the mutex named after the path keeps every transfer of every device of that path waiting.

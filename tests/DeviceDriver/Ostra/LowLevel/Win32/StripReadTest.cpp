@@ -12,7 +12,6 @@ using DeviceDriver::Ostra::LowLevel::PellandoUSBDevice;
 using DeviceDriver::Ostra::LowLevel::ScanRecordList;
 using testing::ElementsAre;
 using testing::IsEmpty;
-using Lines = std::vector<std::string>;
 
 constexpr std::uint32_t ReadPipe = 1;
 constexpr std::uint32_t Timeout = 1000;
@@ -54,21 +53,33 @@ class NativeStripRead : public NativeTest {
     PellandoUSBDevice device{nullptr, "native/1"};
 };
 
-/// What a read brings: bytes that count up from `first`, `after` milliseconds.
-Answer Data(std::size_t count, unsigned first = 1, std::uint32_t after = 0) {
-    return {.data = Counting(count, first), .after = after};
-}
-Answer Failure(ErrorCode code, std::size_t count = 0) {
-    return {.data = Counting(count, 1), .code = code};
-}
+/// What a read brings: so many bytes, which count on from read to read, so many milliseconds after its start.
+struct Brought {
+    Brought(std::size_t bytes, std::uint32_t milliseconds = 0) : count(bytes), after(milliseconds) {}
+    static Brought Failing(ErrorCode code, std::size_t bytes = 0) {
+        Brought failing(bytes);
+        failing.code = code;
+        return failing;
+    }
+    static Brought Refused() {
+        Brought refused(0);
+        refused.refusal = Errors::DeviceNotConnected;
+        return refused;
+    }
+
+    std::size_t count;
+    std::uint32_t after;
+    ErrorCode code = Errors::Success, refusal = Errors::Success;
+};
+const Brought Gone = Brought::Failing(Errors::DeviceNotConnected);
 
 struct StripCase {
     const char* name;
     std::uint32_t recordSize;
     std::uint32_t total;  ///< 0: uncounted
-    std::vector<Answer> answers;
+    std::vector<Brought> brought;
     std::string reads;      ///< the sizes asked for, and "x" for a cancellation
-    std::size_t bytesKept;  ///< of the answers' data, one after the other
+    std::size_t bytesKept;  ///< of those brought
     std::string text = "";  ///< of the exception
     std::uint64_t milliseconds = 0;
 };
@@ -77,91 +88,41 @@ const std::string Failed = "Read data failed (OverlappedRead)";
 const std::string WrongSize = "Read data failed (wrong data size)";
 const std::string TooLarge = "Max packages size is 65535";
 const std::string Empty = "Record size must not be 0";
-const std::string CountedFailed = "system busy. try again. Read data failed (OverlappedRead - ";
-const std::string CountedWrongSize = "system busy. try again. Read data failed (wrong data size - ";
+
+std::string Busy(const std::string& what, int read, int expected, int remaining) {
+    return "system busy. try again. Read data failed (" + what + " - read: " + std::to_string(read) +
+           ", expected: " + std::to_string(expected) + ", remaining: " + std::to_string(remaining) + ")";
+}
+std::string BusyFailed(int read, int expected, int remaining) {
+    return Busy("OverlappedRead", read, expected, remaining);
+}
 
 const StripCase StripCases[] = {
-    {"ends with a short first transfer", 5, 0, {Data(5)}, "10 50 50 x", 5},
-    {"ends with an empty first transfer", 5, 0, {Data(0)}, "10 50 50 x", 0},
-    {"goes on after two records", 5, 0, {Data(10), Data(45, 11)}, "10 50 50 50 x", 55},
-    {"goes on after full chunks",
-     5,
-     0,
-     {Data(10), Data(50, 11), Data(50, 61), Data(0)},
-     "10 50 50 50 50 50 x",
-     110},
-    {"gives each transfer its time",
-     5,
-     0,
-     {Data(10, 1, 3999), Data(50, 11, 7998), Data(5, 61, 7998)},
-     "10 50 50 50 50 x",
-     65,
-     "",
-     11997},
+    {"ends with a short first transfer", 5, 0, {5}, "10 50 50 x", 5},
+    {"ends with an empty first transfer", 5, 0, {0}, "10 50 50 x", 0},
+    {"goes on after two records", 5, 0, {10, 45}, "10 50 50 50 x", 55},
+    {"goes on after full chunks", 5, 0, {10, 50, 50, 0}, "10 50 50 50 50 50 x", 110},
+    {"gives all their time", 5, 0, {{10, 3999}, {50, 7998}, {5, 7998}}, "10 50 50 50 50 x", 65, "", 11997},
     {"fails when the first is late", 5, 0, {}, "10 50 x", 0, Failed, Limit},
-    {"keeps the records before a failure", 5, 0, {Data(10)}, "10 50 50 x", 10, Failed, Limit},
-    {"fails with a transfer",
-     5,
-     0,
-     {Data(10), Failure(Errors::DeviceNotConnected)},
-     "10 50 50 x",
-     10,
-     Failed},
-    {"fails with one that does not start",
-     5,
-     0,
-     {Data(10), {.refusal = Errors::DeviceNotConnected}},
-     "10 50 x",
-     10,
-     Failed},
-    {"refuses broken records", 5, 0, {Data(10), Data(49, 11)}, "10 50 50 x", 10, WrongSize},
-    {"refuses a broken first record", 5, 0, {Data(4)}, "10 50 x", 0, WrongSize},
-    {"largest record", 6553, 0, {Data(6553)}, "13106 65530 65530 x", 6553},
+    {"keeps the records before a failure", 5, 0, {10}, "10 50 50 x", 10, Failed, Limit},
+    {"fails with a transfer", 5, 0, {10, Gone}, "10 50 50 x", 10, Failed},
+    {"fails with one that does not start", 5, 0, {10, Brought::Refused()}, "10 50 50 x", 10, Failed},
+    {"refuses broken records", 5, 0, {10, 49}, "10 50 50 x", 10, WrongSize},
+    {"refuses a broken first record", 5, 0, {4}, "10 50 x", 0, WrongSize},
+    {"largest record", 6553, 0, {6553}, "13106 65530 65530 x", 6553},
     {"too large a record", 6554, 0, {}, "", 0, TooLarge},
     {"record size that wraps", 0x1999999A, 0, {}, "", 0, TooLarge},
     {"empty records", 0, 0, {}, "", 0, Empty},
 
-    {"counted", 5, 120, {Data(50), Data(50, 51), Data(20, 101)}, "50 50 20", 120},
-    {"counted, one chunk", 5, 50, {Data(50)}, "50", 50},
-    {"counted, not whole records", 5, 23, {Data(23)}, "23", 20},
-    {"counted, less than a record", 5, 3, {Data(3)}, "3", 0},
-    {"counted, gives each transfer its time",
-     5,
-     100,
-     {Data(50, 1, 3999), Data(50, 51, 7998)},
-     "50 50",
-     100,
-     "",
-     7998},
-    {"counted, late",
-     5,
-     120,
-     {Data(50)},
-     "50 50 20 x",
-     50,
-     CountedFailed + "read: 0, expected: 50, remaining: 0)",
-     Limit},
-    {"counted, failed",
-     5,
-     170,
-     {Failure(Errors::GeneralFailure)},
-     "50 50 x",
-     0,
-     CountedFailed + "read: 0, expected: 50, remaining: 70)"},
-    {"counted, failed half way",
-     5,
-     50,
-     {Failure(Errors::GeneralFailure, 7)},
-     "50",
-     0,
-     CountedFailed + "read: 7, expected: 50, remaining: 0)"},
-    {"counted, short",
-     5,
-     120,
-     {Data(50), Data(45, 51)},
-     "50 50 20 x",
-     50,
-     CountedWrongSize + "read: 45, expected: 50, remaining: 0)"},
+    {"counted", 5, 120, {50, 50, 20}, "50 50 20", 120},
+    {"counted, one chunk", 5, 50, {50}, "50", 50},
+    {"counted, not whole records", 5, 23, {23}, "23", 20},
+    {"counted, less than a record", 5, 3, {3}, "3", 0},
+    {"counted, gives all their time", 5, 100, {{50, 3999}, {50, 7998}}, "50 50", 100, "", 7998},
+    {"counted, late", 5, 120, {50}, "50 50 20 x", 50, BusyFailed(0, 50, 0), Limit},
+    {"counted, failed", 5, 170, {Gone}, "50 50 x", 0, BusyFailed(0, 50, 70)},
+    {"counted, half way", 5, 50, {Brought::Failing(31, 7)}, "50", 0, BusyFailed(7, 50, 0)},
+    {"counted, short", 5, 120, {50, 45}, "50 50 20 x", 50, Busy("wrong data size", 45, 50, 0)},
     {"counted, too large a record", 6554, 10, {}, "", 0, TooLarge},
     {"counted, empty records", 0, 10, {}, "", 0, Empty},
 };
@@ -173,9 +134,11 @@ TEST_F(NativeStripRead, SizesAndEndings) {
             continue;  // the last moment is a millisecond
         }
         Bytes sent;
-        for (const Answer& answer : row.answers) {
-            driver.Script(ReadPipe, answer);
-            sent.insert(sent.end(), answer.data.begin(), answer.data.end());
+        for (const Brought& read : row.brought) {
+            const Bytes data = Counting(read.count, static_cast<unsigned>(sent.size()));
+            driver.Script(ReadPipe,
+                          {.data = data, .code = read.code, .after = read.after, .refusal = read.refusal});
+            sent.insert(sent.end(), data.begin(), data.end());
         }
         sent.resize(row.bytesKept);
         ScanRecordList records;
@@ -199,49 +162,41 @@ TEST_F(NativeStripRead, SizesAndEndings) {
     }
 }
 
-TEST_F(NativeStripRead, OfNoBytesReadsNothing) {
+TEST_F(NativeStripRead, AppendsToTheListAndBeepsOnceWhenUncounted) {
     ScanRecordList records;
-    device.ReadDataCountedStrip(records, 5, Timeout, 0);
-    EXPECT_THAT(records, IsEmpty());
-    EXPECT_EQ(TakeReads(), "");
-}
-
-TEST_F(NativeStripRead, AppendsToTheList) {
-    ScanRecordList records;
-    driver.Script(ReadPipe, {.data = Counting(5, 1)});
-    device.ReadDataStrip(records, 5, Timeout);
-    driver.Script(ReadPipe, {.data = Counting(5, 6)});
-    device.ReadDataCountedStrip(records, 5, Timeout, 5);
-    EXPECT_EQ(Content(records, 5), Counting(10, 1));
-}
-
-TEST_F(NativeStripRead, BeepsOnceWhenUncounted) {
-    ScanRecordList records;
-    for (const std::size_t size : {10u, 50u, 0u}) {
-        driver.Script(ReadPipe, {.data = Counting(size, 1)});
-    }
+    driver.Script(ReadPipe, {.data = Counting(10)});
+    driver.Script(ReadPipe, {.data = Counting(50, 10)});
+    driver.Script(ReadPipe, {.data = {}});
     device.ReadDataStrip(records, 5, Timeout);
     EXPECT_THAT(beeps, ElementsAre("2140/75"));
-    driver.Script(ReadPipe, {.data = Counting(50, 1)});
-    device.ReadDataCountedStrip(records, 5, Timeout, 50);
+    driver.Script(ReadPipe, {.data = Counting(5, 60)});
+    device.ReadDataCountedStrip(records, 5, Timeout, 5);
+    EXPECT_EQ(Content(records, 5), Counting(65));
+    TakeReads();
+    device.ReadDataCountedStrip(records, 5, Timeout, 0);
+    EXPECT_EQ(TakeReads(), "") << "nothing was asked for";
+    EXPECT_THAT(records, testing::SizeIs(13));
     EXPECT_THAT(beeps, ElementsAre("2140/75"));
 }
 
 TEST_F(NativeStripRead, ReportsAnAbandonedWait) {
-    ScanRecordList records;
-    const AbandonedMutex first;
-    driver.Script(ReadPipe, {.after = Never, .completesThrough = first.Get()});
-    ExpectThrow<TimeoutException>("Read data failed (Abandoned)",
-                                  [&] { device.ReadDataStrip(records, 5, Timeout); });
+    const struct {
+        std::uint32_t total;
+        const char* text;
+    } cases[] = {{0, "Read data failed (Abandoned)"},
+                 {120, "system busy. try again. Read data failed (Abandoned - remaining: 20 total: 120)"}};
+    for (const auto& row : cases) {
+        const AbandonedMutex abandoned;
+        ScanRecordList records;
+        driver.Script(ReadPipe, {.after = Never, .completesThrough = abandoned.Get()});
+        ExpectThrow<TimeoutException>(row.text, [&] {
+            row.total == 0 ? device.ReadDataStrip(records, 5, Timeout)
+                           : device.ReadDataCountedStrip(records, 5, Timeout, row.total);
+        });
+        EXPECT_EQ(driver.Running(ReadPipe), 0u);
+        ReleaseMutex(abandoned.Get());
+    }
     EXPECT_THAT(beeps, IsEmpty());
-    const AbandonedMutex second;
-    driver.Script(ReadPipe, {.after = Never, .completesThrough = second.Get()});
-    ExpectThrow<TimeoutException>(
-        "system busy. try again. Read data failed (Abandoned - remaining: 20 total: 120)",
-        [&] { device.ReadDataCountedStrip(records, 5, Timeout, 120); });
-    EXPECT_EQ(driver.Running(ReadPipe), 0u);
-    ReleaseMutex(first.Get());
-    ReleaseMutex(second.Get());
 }
 
 /// The completions of the two outstanding reads share one signal. Whatever their order, no read may be waited

@@ -1,29 +1,15 @@
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-
-#include <atomic>
-#include <mutex>
-#include <numeric>
-
 #include "Platform/ScopedThreadPriority.h"
 #include "Platform/Time.h"
-#include "Protocol/Instrument.h"
-#include "UsbIoTransportFixture.h"
+#include "Protocol/UsbIoDriver.h"
+#include "UsbIoTest.h"
 
-namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+namespace Varnholt::Tests {
 namespace {
 
-using namespace Protocol::UsbIoDriver;
-using Generic::Utilities::DataException;
-using Generic::Utilities::IOException;
+using DeviceDriver::Ostra::LowLevel::PellandoFunctionalityByte;
 using Protocol::BulkInEndpoint;
-using testing::ElementsAreArray;
-using Tests::TextOf;
-using Tests::UsbIoAnswer;
-using Tests::VendorOut;
-using Bytes = std::vector<std::uint8_t>;
+using Protocol::UsbIoDriver::Status::EndpointHalted;
 
-constexpr std::uint32_t Never = UsbIoAnswer::Never;
 constexpr std::uint32_t Whole = 65536;
 
 /// Bytes of a stream, different from one 256-byte record to the next.
@@ -36,9 +22,9 @@ Bytes Stream(std::size_t from, std::size_t count) {
     return bytes;
 }
 
-class UsbIoScanTest : public Tests::UsbIoTransportFixture {
+class UsbIoScan : public UsbIoTest {
   protected:
-    UsbIoScanTest() {
+    UsbIoScan() {
         Platform::ObserveBeeps([this](std::uint32_t hertz, std::uint32_t milliseconds) {
             {
                 const std::lock_guard held(beepLock);
@@ -47,7 +33,7 @@ class UsbIoScanTest : public Tests::UsbIoTransportFixture {
             Platform::SignalEvent(beeped.Get());
         });
     }
-    ~UsbIoScanTest() override { Platform::ObserveBeeps({}); }
+    ~UsbIoScan() override { Platform::ObserveBeeps({}); }
 
     /// The instrument sends the stream in transfers of these sizes, one after the other.
     void Send(const std::vector<std::uint32_t>& sizes, std::uint32_t after) {
@@ -80,25 +66,24 @@ std::string Read(std::uint32_t size) {
     return "read 82 [" + std::to_string(size) + "]";
 }
 
-TEST_F(UsbIoScanTest, FixedScans) {
+TEST_F(UsbIoScan, FixedScans) {
     struct Case {
         const char* name;
         std::uint32_t total;
         std::vector<std::uint32_t> transfers;  ///< what the instrument sends
         std::vector<std::uint32_t> reads;      ///< what it is asked for
-        bool cancels;
         std::uint32_t end;
     };
     const std::vector<Case> cases{
-        {"two transfers", 100000, {Whole, 34464, 0}, {Whole, 34464, 0, 0}, true, 100000},
-        {"short", 100000, {Whole, 4464}, {Whole, 34464, 0}, true, 70000},
-        {"short at once", 100000, {10}, {Whole, 34464}, true, 10},
-        {"empty at once", 100000, {0}, {Whole, 34464}, true, 0},
-        {"less than a transfer", 256, {256, 0}, {256, 0, 0}, true, 256},
-        {"one byte", 1, {1, 0}, {1, 0, 0}, true, 1},
-        {"a whole transfer", Whole, {Whole, 0}, {Whole, 0, 0}, true, Whole},
-        {"a byte more", Whole + 1, {Whole, 1, 0}, {Whole, 1, 0, 0}, true, Whole + 1},
-        {"several", 3 * Whole, {Whole, Whole, Whole, 0}, {Whole, Whole, Whole, 0, 0}, true, 3 * Whole},
+        {"two transfers", 100000, {Whole, 34464, 0}, {Whole, 34464, 0, 0}, 100000},
+        {"short", 100000, {Whole, 4464}, {Whole, 34464, 0}, 70000},
+        {"short at once", 100000, {10}, {Whole, 34464}, 10},
+        {"empty at once", 100000, {0}, {Whole, 34464}, 0},
+        {"less than a transfer", 256, {256, 0}, {256, 0, 0}, 256},
+        {"one byte", 1, {1, 0}, {1, 0, 0}, 1},
+        {"a whole transfer", Whole, {Whole, 0}, {Whole, 0, 0}, Whole},
+        {"a byte more", Whole + 1, {Whole, 1, 0}, {Whole, 1, 0, 0}, Whole + 1},
+        {"several", 3 * Whole, {Whole, Whole, Whole, 0}, {Whole, Whole, Whole, 0, 0}, 3 * Whole},
     };
     for (const std::uint32_t after : {0U, 1U}) {
         for (const Case& row : cases) {
@@ -106,14 +91,12 @@ TEST_F(UsbIoScanTest, FixedScans) {
             sent = 0;
             Send(row.transfers, after);
             instrument->StartScan(256, 1, row.total);
-            std::vector<std::string> expected{VendorOut(0xC0)};
+            Lines expected{"control 80942035 00 00 00 00 02 00 00 00 00 00 00 00 00 C0 00 00 00 00 /"};
             for (const std::uint32_t size : row.reads) {
                 expected.push_back(Read(size));
             }
-            if (row.cancels) {
-                expected.emplace_back("cancel 82");
-            }
-            EXPECT_THAT(TakeTransfers(), ElementsAreArray(expected)) << row.name;
+            expected.emplace_back("cancel 82");
+            EXPECT_THAT(TakeTranscript(), testing::ElementsAreArray(expected)) << row.name;
             EXPECT_EQ(TakeAll(*instrument, 256), Stream(0, row.end)) << row.name;
             EXPECT_EQ(driver.Running(BulkInEndpoint), 0U) << row.name;
         }
@@ -121,13 +104,13 @@ TEST_F(UsbIoScanTest, FixedScans) {
     EXPECT_TRUE(beeps.empty());
 }
 
-TEST_F(UsbIoScanTest, OpenEndedScansGrow) {
+TEST_F(UsbIoScan, OpenEndedScansGrow) {
     const auto instrument = Open();
     for (const std::uint32_t total : {0U, 256U, Whole, 1280000U, 2000000U}) {
         sent = 0;
         Send(std::vector<std::uint32_t>(total / Whole, Whole), 0);
         Send({total % Whole}, 1);
-        const Tests::Stopwatch stopwatch(clock);
+        const Stopwatch stopwatch(clock);
         instrument->StartScan(256, 1, 0);
         EXPECT_LT(stopwatch.Milliseconds(), 300U) << "a scan does not wait for its beep";
         EXPECT_EQ(TakeAll(*instrument, 100000), Stream(0, total)) << total;
@@ -141,7 +124,7 @@ TEST_F(UsbIoScanTest, OpenEndedScansGrow) {
     }
 }
 
-TEST_F(UsbIoScanTest, AReadIsPendingWhileTheOtherIsProcessed) {
+TEST_F(UsbIoScan, AReadIsPendingWhileTheOtherIsProcessed) {
     // An instrument that completes a transfer only when it has got the next one.
     const auto instrument = Open();
     std::vector<bool> completed;
@@ -157,7 +140,7 @@ TEST_F(UsbIoScanTest, AReadIsPendingWhileTheOtherIsProcessed) {
     EXPECT_EQ(TakeAll(*instrument, Whole), Stream(0, sent));
 }
 
-TEST_F(UsbIoScanTest, WhatComesBehindTheEndIsDropped) {
+TEST_F(UsbIoScan, WhatComesBehindTheEndIsDropped) {
     const auto instrument = Open();
     driver.Script(BulkInEndpoint, {.data = Stream(0, 100), .after = 2});
     driver.Script(BulkInEndpoint,
@@ -167,10 +150,10 @@ TEST_F(UsbIoScanTest, WhatComesBehindTheEndIsDropped) {
     EXPECT_EQ(TakeAll(*instrument, 64), Stream(0, 100));
 }
 
-TEST_F(UsbIoScanTest, FailedScansLeaveNothing) {
+TEST_F(UsbIoScan, FailedScansLeaveNothing) {
     struct Case {
         const char* name;
-        UsbIoAnswer answer;
+        Answer answer;
         const char* text;
         std::uint32_t waits;
     };
@@ -187,9 +170,9 @@ TEST_F(UsbIoScanTest, FailedScansLeaveNothing) {
          {.data = Bytes(9), .after = Never, .cancelledWithData = true},
          timedOut,
          8840},
-        {"fails", {.code = Status::EndpointHalted, .after = 3}, halted, 0},
-        {"fails at once", {.code = Status::EndpointHalted}, halted, 0},
-        {"cannot be started", {.code = Status::EndpointHalted, .refused = true}, halted, 0},
+        {"fails", {.code = EndpointHalted, .after = 3}, halted, 0},
+        {"fails at once", {.code = EndpointHalted}, halted, 0},
+        {"cannot be started", {.refusal = EndpointHalted}, halted, 0},
     };
     const auto instrument = Open();
     for (const Case& row : cases) {
@@ -197,10 +180,8 @@ TEST_F(UsbIoScanTest, FailedScansLeaveNothing) {
         Send({Whole}, 1);
         driver.Script(BulkInEndpoint, row.answer);
         const int priority = Platform::CurrentThreadPriority();
-        const Tests::Stopwatch stopwatch(clock);
-        EXPECT_EQ(TextOf<IOException>([&] { instrument->StartScan(256, 1, 3 * Whole); }), row.text)
-            << row.name;
-        SCOPED_TRACE(row.name);
+        const Stopwatch stopwatch(clock);
+        ExpectThrow<IOException>(row.text, [&] { instrument->StartScan(256, 1, 3 * Whole); });
         stopwatch.ExpectBetween(row.waits, row.waits + 40);
         EXPECT_EQ(Platform::CurrentThreadPriority(), priority);
         EXPECT_EQ(driver.Running(BulkInEndpoint), 0U) << row.name;
@@ -212,7 +193,7 @@ TEST_F(UsbIoScanTest, FailedScansLeaveNothing) {
     EXPECT_EQ(TakeAll(*instrument, 256), Stream(0, 10)) << "and the next one works";
 }
 
-TEST_F(UsbIoScanTest, ThePriorityIsRaisedForTheScanOnly) {
+TEST_F(UsbIoScan, ThePriorityIsRaisedForTheScanOnly) {
     const auto instrument = Open();
     const Platform::ScopedThreadPriority usual(-1);
     const int before = Platform::CurrentThreadPriority();
@@ -230,7 +211,7 @@ TEST_F(UsbIoScanTest, ThePriorityIsRaisedForTheScanOnly) {
     EXPECT_EQ(Platform::CurrentThreadPriority(), before);
 }
 
-TEST_F(UsbIoScanTest, DataAreHandedOutInPiecesAndNeverBehindTheEnd) {
+TEST_F(UsbIoScan, DataAreHandedOutInPiecesAndNeverBehindTheEnd) {
     const auto instrument = Open();
     std::uint32_t size = 4;
     Bytes part(8, 0xEE);
@@ -253,22 +234,22 @@ TEST_F(UsbIoScanTest, DataAreHandedOutInPiecesAndNeverBehindTheEnd) {
     EXPECT_EQ(all, Stream(0, 10));
 }
 
-TEST_F(UsbIoScanTest, MoreThanWasAskedForIsRefused) {
+TEST_F(UsbIoScan, MoreThanWasAskedForIsRefused) {
     // No driver should report more than a read asked for; where one does, a fixed scan stays within its size.
     const auto instrument = Open();
     const auto scanTooMuch = [&] {
-        driver.Script(BulkInEndpoint, {.data = Bytes(100), .after = 1, .reportedCount = 101});
+        driver.Script(BulkInEndpoint, {.data = Bytes(100), .after = 1, .count = 101});
         instrument->StartScan(256, 1, 100);
     };
-    EXPECT_EQ(TextOf<DataException>(scanTooMuch), "buffer size is fix");
+    ExpectThrow<DataException>("buffer size is fix", scanTooMuch);
     EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
     sent = 0;
     Send({5000, 0}, 1);
     instrument->StartScan(256, 1, 5000);
     // Now there would be room for it.
-    EXPECT_EQ(TextOf<DataException>(scanTooMuch), "more bytes read than expected");
+    ExpectThrow<DataException>("more bytes read than expected", scanTooMuch);
     EXPECT_EQ(TakeAll(*instrument, 256), Bytes());
 }
 
 }  // namespace
-}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel
+}  // namespace Varnholt::Tests

@@ -13,18 +13,18 @@
 
 #include "Platform/DeviceFiles.h"
 #include "Platform/EventScheduler.h"
-#include "Support/ScriptedUsbDevice.h"
+#include "Support/Exchange.h"
 
 namespace Varnholt::Tests {
 
 inline constexpr std::uint32_t Never = 0xFFFFFFFF;
 
-/// How one transfer goes.
+/// How one transfer goes. Times are milliseconds.
 struct Answer {
     /// What a read or an inward control brings; its size is the count. Outward transfers move everything.
     Bytes data{};
     Platform::ErrorCode code = Platform::Errors::Success;
-    std::uint32_t after = 0;               ///< milliseconds; 0: completes inside its start
+    std::uint32_t after = 0;               ///< 0: completes inside its start
     std::optional<std::uint32_t> count{};  ///< instead of the true count
 
     Platform::ErrorCode refusal = Platform::Errors::Success;  ///< the start fails
@@ -39,34 +39,42 @@ struct Answer {
     std::function<void()> onStart{};  ///< called by the starter, before anything else
 };
 
-/// The instrument's kernel driver as a script. Each pipe has answers of its own, taken in order; without one,
-/// controls and writes succeed at once and reads stay pending. Writes into a buffer only between the start
-/// and the completion that it reports, and keeps a transcript:
-///     open PATH, close PATH             files, by path
-///     control CODE BLOCK DATA           outward: the bytes sent
-///     control CODE BLOCK [LENGTH]       inward: the room for the answer
-///     read PIPE [LENGTH], write PIPE DATA
-///     cancel PIPE                       only where something was running
+/// The kernel drivers as a script: the instrument's own below paths that begin with "native/", USBIO below
+/// all others. Each place has answers of its own, taken in order: a pipe of the former, an endpoint of the
+/// latter, a control code, and 0 for any control. Without an answer, controls and writes succeed at once and
+/// reads stay pending. Writes into a buffer only between the start and the completion that it reports, and
+/// keeps a transcript:
+///     open PATH, close PATH
+///     control CODE INPUT / DATA      outward: the bytes sent
+///     control CODE INPUT / [LENGTH]  inward: the room for the answer
+///     read PLACE [LENGTH], write PLACE DATA
+///     cancel PLACE                   only where something was running
 /// Any thread; no platform call is made with the lock held.
 class ScriptedDriver final : public Platform::DeviceFileSystem {
   public:
-    explicit ScriptedDriver(std::vector<std::string> instrumentPaths = {"native/1"});
+    explicit ScriptedDriver(std::vector<std::string> devicePaths = {"native/1", "usbio/1"});
     ~ScriptedDriver() override;
 
-    void Script(std::uint32_t pipe, Answer answer);
-    void DropScript(std::uint32_t pipe);
+    void Script(std::uint32_t place, Answer answer);
+    void DropScript(std::uint32_t place);
     void RefuseOpen(const std::string& path, Platform::ErrorCode code);
     /// Called by every opener of the path, who waits for its end.
     void BeforeOpen(const std::string& path, std::function<void()> action);
-    /// Completes the oldest running transfer of the pipe; false if none runs.
-    bool Complete(std::uint32_t pipe, const Answer& answer);
+    /// Completes the oldest running transfer of the pipe or endpoint, as it was scripted or with another
+    /// answer; false if none runs.
+    bool Complete(std::uint32_t place) { return CompleteAs(place, nullptr); }
+    bool Complete(std::uint32_t place, const Answer& answer) { return CompleteAs(place, &answer); }
 
-    /// What happened since the last call, without opens and closes of files.
-    std::vector<std::string> TakeTransfers();
+    /// What happened since the last call; the transfers are all but opens and closes of files.
     std::vector<std::string> TakeTranscript();
-    std::uint32_t OpenFiles() const;
-    std::uint32_t RunningTransfers() const;
-    std::uint32_t Running(std::uint32_t pipe) const;
+    std::vector<std::string> TakeTransfers();
+    std::size_t OpenFiles() const;
+    std::size_t RunningTransfers() const;
+    std::size_t Running(std::uint32_t place) const;  ///< 0: controls
+    /// What all reads of the place brought in together.
+    std::uint64_t BytesIn(std::uint32_t place) const;
+    /// The most controls that were ever running at once.
+    std::size_t MostControlsAtOnce() const;
 
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
     Platform::Handle Open(const std::string& path) override;
@@ -84,12 +92,13 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
   private:
     struct File {
         std::string path;
-        std::uint32_t pipe;
+        std::uint32_t place;  ///< of its reads and writes
         bool isOpen = true;
     };
     struct Transfer {
         std::uint64_t number;
-        File* file;
+        const File* file;
+        std::uint32_t place;
         Platform::Overlapped* record;
         std::uint8_t* target;  ///< null when nothing comes in
         std::uint32_t length;
@@ -98,11 +107,15 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
         bool isCancelled = false;
     };
 
-    File* Find(Platform::Handle handle) const;
-    bool Start(File* file, std::string line, std::uint8_t* target, std::uint32_t length, const Answer& usual,
-               Platform::Overlapped& record);
+    bool CompleteAs(std::uint32_t place, const Answer* answer);
+    File* Find(Platform::Handle handle);
+    Answer TakeAnswer(std::uint32_t place, std::uint32_t code, const Answer& usual);
+    /// `code`: of a control; 0 for others.
+    bool Start(const File& file, std::uint32_t code, std::string line, std::uint8_t* target,
+               std::uint32_t length, const Answer& usual, Platform::Overlapped& record);
     void End(std::uint64_t number, Platform::ErrorCode code, bool withData);
     void EndLater(std::uint64_t number, std::uint64_t microseconds, Platform::ErrorCode code, bool withData);
+    void EndAll(const File& file);
 
     const std::vector<std::string> paths;
     mutable std::mutex lock;  ///< guards what follows
@@ -113,7 +126,9 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     std::map<std::string, std::function<void()>> openActions;
     std::vector<std::string> transcript;
     std::vector<Platform::EventScheduler::EventId> events;
+    std::map<std::uint32_t, std::uint64_t> bytesIn;
     std::uint64_t lastNumber = 0;
+    std::size_t mostControls = 0;
 };
 
 }  // namespace Varnholt::Tests

@@ -1,0 +1,339 @@
+#include <atomic>
+#include <stdexcept>
+
+#include "DeviceDriver/Ostra/LowLevel/Win32/InterruptListener.h"
+#include "DeviceDriver/Ostra/LowLevel/Win64/InterruptListener_Win64.h"
+#include "Platform/CallFilter.h"
+#include "Protocol/Instrument.h"
+#include "Protocol/NativeDriver.h"
+#include "Support/DriverTest.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using namespace Platform;
+using DeviceDriver::Generic::MessageButtonData;
+using DeviceDriver::Generic::MessageDeviceGone;
+using DeviceDriver::Ostra::LowLevel::InterruptListener;
+using DeviceDriver::Ostra::LowLevel::InterruptListener_Win64;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using Codes = std::vector<std::uint32_t>;
+using UsbIoPipe = Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe>;
+
+const Answer Press{.data = {1}, .after = 5};
+const Answer Silence{.after = Never};
+const Answer Gone{.code = Errors::DeviceNotConnected, .after = 5};
+
+struct OverNative {
+    using Listener = InterruptListener;
+    static constexpr bool IsUsbIo = false;
+    static constexpr std::uint32_t Place = Protocol::NativeDriver::InterruptPipe;
+    static std::unique_ptr<Listener> Make(const UsbIoPipe&) { return std::make_unique<Listener>("native/1"); }
+};
+
+struct OverUsbIo {
+    using Listener = InterruptListener_Win64;
+    static constexpr bool IsUsbIo = true;
+    static constexpr std::uint32_t Place = Protocol::InterruptInEndpoint;
+    static std::unique_ptr<Listener> Make(const UsbIoPipe& pipe) {
+        auto listener = std::make_unique<Listener>("not used");
+        listener->SetPipe(pipe);
+        return listener;
+    }
+};
+
+template <class Transport>
+class InterruptListeners : public DriverTest {
+  protected:
+    static constexpr std::uint32_t Place = Transport::Place;
+
+    InterruptListeners() { EXPECT_EQ(pipe->Bind(0, Protocol::InterruptInEndpoint, nullptr, nullptr), 0U); }
+    ~InterruptListeners() override { InstallCallFilter({}); }
+
+    /// The answers to the reads that count.
+    void Script(const std::vector<Answer>& answers) {
+        driver.DropScript(Place);
+        if (Transport::IsUsbIo) {
+            driver.Script(Place, Silence);  // to the one for what is left from before
+        }
+        for (const Answer& answer : answers) {
+            driver.Script(Place, answer);
+        }
+    }
+    void Start() {
+        listener->SetListener(&receiver);
+        listener->Start();
+    }
+    void WaitForMessages(std::size_t count) {
+        WaitUntil([&] { return receiver.Codes().size() >= count; });
+    }
+    void WaitForRead() {
+        WaitUntil([&] { return driver.Running(Place) == 1; });
+    }
+    void StopWithin(std::uint64_t milliseconds) {
+        const Stopwatch watch(clock);
+        listener->Stop();
+        watch.ExpectAtMost(milliseconds);
+    }
+
+    const UsbIoPipe pipe{new UsbIo::CUsbIoPipe};
+    RecordingListener receiver;
+    std::unique_ptr<typename Transport::Listener> listener = Transport::Make(pipe);
+};
+using BothTransports = testing::Types<OverNative, OverUsbIo>;
+TYPED_TEST_SUITE(InterruptListeners, BothTransports);
+
+TYPED_TEST(InterruptListeners, TurnReadsIntoMessages) {
+    enum On { Both, Native, UsbIo };
+    const struct {
+        const char* name;
+        On on;
+        std::vector<Answer> reads;
+        Codes messages;
+        bool touched;
+    } cases[] = {
+        {"gone", Both, {Gone}, {MessageDeviceGone}, false},
+        {"gone at once", Both, {{.code = Errors::DeviceNotConnected}}, {MessageDeviceGone}, false},
+        {"gone before", Both, {{.refusal = Errors::DeviceNotConnected}}, {MessageDeviceGone}, false},
+        {"refused", Both, {{.refusal = Errors::AccessDenied}}, {MessageDeviceGone}, false},
+        {"pressed",
+         Both,
+         {Press, Press, Gone},
+         {MessageButtonData, MessageButtonData, MessageDeviceGone},
+         true},
+        {"nothing", Native, {{.after = 5}}, {MessageDeviceGone}, false},
+        {"nothing", UsbIo, {{.after = 5}, Gone}, {MessageButtonData, MessageDeviceGone}, true},
+        {"pressed late", UsbIo, {Silence, Press, Gone}, {MessageButtonData, MessageDeviceGone}, true},
+        {"pressed as the read was given up",
+         UsbIo,
+         {{.data = {1}, .after = Never, .cancelledWithData = true}, Gone},
+         {MessageButtonData, MessageDeviceGone},
+         true},
+    };
+    for (const auto& row : cases) {
+        if (row.on != Both && row.on != (TypeParam::IsUsbIo ? UsbIo : Native)) {
+            continue;
+        }
+        SCOPED_TRACE(row.name);
+        RecordingListener messages;
+        this->Script(row.reads);
+        const auto watching = TypeParam::Make(this->pipe);
+        watching->SetListener(&messages);
+        EXPECT_FALSE(watching->IsTouched());
+        watching->Start();
+        WaitUntil([&] { return messages.Codes().size() >= row.messages.size(); });
+        watching->Stop();  // the thread has ended by itself
+        EXPECT_EQ(messages.Codes(), row.messages);
+        EXPECT_EQ(watching->IsTouched(), row.touched);
+        EXPECT_EQ(this->driver.Running(this->Place), 0U);
+    }
+}
+
+TYPED_TEST(InterruptListeners, ReportNothingOnceTheirReceiverIsTakenAway) {
+    this->Script({Press, Press, Silence});
+    this->receiver.onMessage = [this](std::uint32_t) { this->listener->ClearListener(); };
+    this->Start();
+    this->WaitForMessages(1);
+    SleepMilliseconds(100);  // the second one has come by then
+    this->WaitForRead();
+    this->StopWithin(10);
+    EXPECT_TRUE(this->listener->IsTouched());
+    EXPECT_THAT(this->receiver.Codes(), ElementsAre(MessageButtonData)) << "nor by Stop";
+}
+
+/// Wherever its thread is just then: before, in or after the start of a read, in the first one or a later
+/// one.
+TYPED_TEST(InterruptListeners, StopAtOnce) {
+    this->StopWithin(0);  // without a thread
+    for (std::uint32_t round = 0; round < 100; ++round) {
+        SCOPED_TRACE(round);
+        this->listener = TypeParam::Make(this->pipe);
+        this->Script({{.data = {1}}, Silence});
+        this->listener->Start();
+        SleepMilliseconds(round / 3);
+        this->StopWithin(1);
+        EXPECT_EQ(this->driver.Running(this->Place), 0U);
+    }
+}
+
+TYPED_TEST(InterruptListeners, StopFromInsideAMessage) {
+    std::atomic<bool> stopped = false;
+    this->Script({Press});
+    this->receiver.onMessage = [&](std::uint32_t) {
+        EXPECT_TRUE(this->listener->IsTouched());
+        this->StopWithin(0);
+        stopped = true;
+    };
+    this->Start();
+    WaitUntil([&] { return stopped.load(); });
+    SleepMilliseconds(100);
+    EXPECT_THAT(this->receiver.Codes(), ElementsAre(MessageButtonData));
+    EXPECT_EQ(this->driver.Running(this->Place), 0U);
+}
+
+TYPED_TEST(InterruptListeners, EndWithAReceiverThatThrows) {
+    this->receiver.onMessage = [](std::uint32_t) { throw std::runtime_error("receiver"); };
+    this->Script({Press});
+    this->Start();
+    this->WaitForMessages(1);
+    SleepMilliseconds(10);
+    EXPECT_EQ(this->driver.Running(this->Place), 0U);
+    this->StopWithin(10);
+}
+
+TYPED_TEST(InterruptListeners, TakeAFailureDuringTheStopForNoMessage) {
+    std::atomic<bool> isInRead = false;
+    this->Script({{.refusal = Errors::DeviceNotConnected, .onStart = [&] {
+                       isInRead = true;
+                       SleepMilliseconds(50);
+                   }}});
+    this->Start();
+    WaitUntil([&] { return isInRead.load(); });
+    this->StopWithin(50);
+    EXPECT_THAT(this->receiver.Codes(), IsEmpty());
+}
+
+/// The thread comes back when nobody waits for it any more, and must find its things in place.
+TYPED_TEST(InterruptListeners, AreNotHeldUpByAReceiverThatDoesNotReturn) {
+    const OwnedHandle release(MakeAutoResetEvent());
+    this->receiver.onMessage = [&](std::uint32_t) { Wait(release.Get(), Infinite); };
+    this->Script({Press});
+    this->Start();
+    this->WaitForMessages(1);
+    this->StopWithin(11'000);
+    EXPECT_FALSE(TypeParam::IsUsbIo && this->pipe->IsOpen());
+    SignalEvent(release.Get());
+    this->listener->ClearListener();  // over USBIO, after the message where the thread could not be ended
+    SleepMilliseconds(10);
+}
+
+TYPED_TEST(InterruptListeners, SayWhenTheThreadCannotBeMade) {
+    InstallCallFilter([](std::string_view call) {
+        return call == "StartThread" ? Errors::NoSystemResources : Errors::Success;
+    });
+    ExpectThrow<IOException>("could not create interrupt listener thread",
+                             [this] { this->listener->Start(); });
+    this->StopWithin(0);
+}
+
+using NativeInterruptListener = InterruptListeners<OverNative>;
+const std::string InterruptPath = "native/1\\PIPE03";
+
+TEST_F(NativeInterruptListener, NeedsEvents) {
+    InstallCallFilter([](std::string_view call) {
+        return call == "MakeAutoResetEvent" ? Errors::NoSystemResources : Errors::Success;
+    });
+    ExpectThrow<IOException>("could not create interrupt listener events",
+                             [] { const InterruptListener other("native/1"); });
+}
+
+TEST_F(NativeInterruptListener, IsBoundedWhateverHoldsUpTheOpeningOfThePipe) {
+    const struct {
+        const char* name;
+        std::uint32_t opensAfter;   ///< milliseconds; 0: is refused
+        std::uint64_t startAndEnd;  ///< milliseconds
+        Lines transcript;
+    } cases[] = {
+        {"no pipe", 0, 2000, {}},
+        {"too late: closed unread", 3500, 3500, {"open " + InterruptPath, "close " + InterruptPath}},
+#if defined(_WIN32)
+        {"hangs: the thread is ended by force", 15'000, 2000 + 11'000, {}},
+#else
+        {"hangs: left to itself", 15'000, 2000 + 11'000, {"open " + InterruptPath, "close " + InterruptPath}},
+#endif
+    };
+    for (const auto& row : cases) {
+        SCOPED_TRACE(row.name);
+        ScriptedDriver slow;
+        const ScopedDeviceFiles inForce(slow);
+        if (row.opensAfter == 0) {
+            slow.RefuseOpen(InterruptPath, Errors::FileNotFound);
+        } else {
+            slow.BeforeOpen(InterruptPath, [&] { SleepMilliseconds(row.opensAfter); });
+        }
+        const Stopwatch watch(clock);
+        {
+            InterruptListener other("native/1");
+            ExpectThrow<IOException>("interrupt listener thread had timeout", [&] { other.Start(); });
+            watch.Expect(2000);
+        }
+        watch.Expect(row.startAndEnd);
+        SleepMilliseconds(3000);
+        EXPECT_EQ(slow.TakeTranscript(), row.transcript);
+    }
+}
+
+TEST_F(NativeInterruptListener, EndsAReadThatCannotBeCancelledWithItsPipe) {
+    Script({{.after = Never, .cancelledAfter = Never}});
+    Start();
+    WaitForRead();
+    const Stopwatch watch(clock);
+    listener->Stop();
+    watch.ExpectBetween(10'000, 11'000);
+    EXPECT_EQ(driver.RunningTransfers(), 0U);
+    EXPECT_THAT(driver.TakeTranscript(), testing::Contains("close " + InterruptPath));
+    EXPECT_THAT(receiver.Codes(), IsEmpty());
+}
+
+using UsbIoInterruptListener = InterruptListeners<OverUsbIo>;
+
+TEST_F(UsbIoInterruptListener, ThrowsAnInterruptFromBeforeAway) {
+    driver.Script(Place, {.data = {1}, .after = 1});
+    Start();
+    SleepMilliseconds(50);
+    WaitForRead();
+    listener->Stop();
+    EXPECT_THAT(receiver.Codes(), IsEmpty());
+    EXPECT_FALSE(listener->IsTouched());
+}
+
+TEST_F(UsbIoInterruptListener, TakesItsReceiverAwayOnlyAfterTheMessageUnderWay) {
+    std::atomic<bool> inMessage = false;
+    receiver.onMessage = [&](std::uint32_t) {
+        inMessage = true;
+        SleepMilliseconds(100);
+        inMessage = false;
+    };
+    Script({Press});
+    Start();
+    WaitForMessages(1);
+    listener->ClearListener();
+    EXPECT_FALSE(inMessage);
+    listener->Stop();
+}
+
+TEST(UsbIoInterruptListenerRace, NoInterruptIsLostOrCountedTwice) {
+    // Interrupts about the time when a read is given up, bytes that a cancelled read has moved all the same,
+    // and a stop in the middle of it.
+    constexpr std::uint32_t Place = OverUsbIo::Place;
+    for (std::uint64_t seed = 1; seed <= TestClock::SeedsToTry; ++seed) {
+        const TestClock clock(TestTime::RealForThreadSanitizer, seed);
+        ScriptedDriver driver;
+        const ScopedDeviceFiles files(driver);
+        const UsbIoPipe pipe(new UsbIo::CUsbIoPipe);
+        ASSERT_EQ(pipe->Bind(0, Protocol::InterruptInEndpoint, nullptr, nullptr), 0U);
+        driver.Script(Place, Silence);  // what is left from before
+        for (std::uint32_t i = 0; i < 40; ++i) {
+            driver.Script(Place, {.data = {1},
+                                  .after = 998 + i % 5,
+                                  .cancelledAfter = i % 4,
+                                  .cancelledWithData = i % 3 == 0});
+        }
+        RecordingListener receiver;
+        const auto listener = OverUsbIo::Make(pipe);
+        listener->SetListener(&receiver);
+        listener->Start();
+        while (receiver.Codes().size() < seed % 10) {
+            SleepMilliseconds(1);
+        }
+        SleepMilliseconds(993 + static_cast<std::uint32_t>(seed % 13));
+        listener->Stop();
+        EXPECT_THAT(receiver.Codes(), testing::Each(MessageButtonData));
+        ASSERT_EQ(receiver.Codes().size(), driver.BytesIn(Place)) << seed;
+        ASSERT_EQ(driver.Running(Place), 0U) << seed;
+    }
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests

@@ -1,0 +1,112 @@
+#pragma once
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <mutex>
+#include <string>
+#include <typeinfo>
+#include <utility>
+#include <vector>
+
+#include "DeviceDriver/Generic/EventListener.h"
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "Platform/EventScheduler.h"
+#include "Platform/Threads.h"
+#include "Platform/WaitableObjects.h"
+#include "Support/ScriptedDriver.h"
+#include "Support/TestClock.h"
+
+namespace Varnholt::Tests {
+
+using DeviceDriver::Generic::Utilities::DataException;
+using DeviceDriver::Generic::Utilities::IOException;
+using DeviceDriver::Generic::Utilities::TimeoutException;
+using Lines = std::vector<std::string>;
+
+/// The scripted driver as the device files in force.
+class DriverTest : public testing::Test {
+  protected:
+    explicit DriverTest(TestTime time = TestTime::RealForThreadSanitizer,
+                        std::vector<std::string> paths = {"native/1", "usbio/1"})
+        : clock(time), driver(std::move(paths)) {}
+
+    TestClock clock;  // before all that has to do with time
+    ScriptedDriver driver;
+    Platform::ScopedDeviceFiles files{driver};
+};
+
+/// Lets other threads get on until `condition` holds; fails the test when that takes 20 seconds.
+template <class Condition>
+void WaitUntil(Condition condition) {
+    const std::uint64_t end = Platform::ClockScheduler().Now() + 20'000'000;
+    while (!condition()) {
+        if (Platform::ClockScheduler().Now() > end) {
+            ADD_FAILURE() << "waited in vain";
+            return;
+        }
+        Platform::SleepMilliseconds(1);
+    }
+}
+
+/// Exactly this class, with this text.
+template <class Expected>
+void ExpectThrow(const std::string& text, const std::function<void()>& operation) {
+    try {
+        operation();
+        ADD_FAILURE() << "nothing thrown, expected: " << text;
+    } catch (const std::exception& exception) {
+        EXPECT_EQ(typeid(exception), typeid(Expected));
+        EXPECT_EQ(exception.what(), text);
+    }
+}
+
+/// Runs a function on a thread of the platform; waits for its end.
+class BackgroundThread final {
+  public:
+    explicit BackgroundThread(std::function<void()> entry) : body(std::move(entry)) {
+        thread = Platform::OwnedHandle(Platform::StartThread(
+            [](void* self) {
+                static_cast<BackgroundThread*>(self)->body();
+                return std::uint32_t{0};
+            },
+            this));
+    }
+    ~BackgroundThread() { Join(); }
+    BackgroundThread(const BackgroundThread&) = delete;
+    BackgroundThread& operator=(const BackgroundThread&) = delete;
+
+    void Join() { Platform::Wait(thread.Get(), Platform::Infinite); }
+    bool HasEnded() { return Platform::Wait(thread.Get(), 0) == Platform::WaitResult::Signalled; }
+
+  private:
+    const std::function<void()> body;
+    Platform::OwnedHandle thread;
+};
+
+/// Notes messages; does what the test wants inside them.
+class RecordingListener final : public DeviceDriver::Generic::EventListener {
+  public:
+    void MessageFromDevice(std::uint32_t code, std::uint32_t parameter) override {
+        {
+            const std::lock_guard held(lock);
+            codes.push_back(code + parameter);
+        }
+        if (onMessage) {
+            onMessage(code);
+        }
+    }
+    std::vector<std::uint32_t> Codes() {
+        const std::lock_guard held(lock);
+        return codes;
+    }
+
+    std::function<void(std::uint32_t code)> onMessage;
+
+  private:
+    std::mutex lock;
+    std::vector<std::uint32_t> codes;
+};
+
+}  // namespace Varnholt::Tests

@@ -1,0 +1,391 @@
+#include "Support/ScriptedDriver.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <utility>
+
+#include "Platform/Threads.h"
+#include "Platform/WaitableObjects.h"
+#include "Protocol/NativeDriver.h"
+#include "Protocol/UsbIoDriver.h"
+
+namespace Varnholt::Tests {
+
+using namespace Platform;
+namespace UsbIoControl = Protocol::UsbIoDriver::Control;
+
+namespace {
+
+// What `Overlapped::internal` holds.
+constexpr std::uintptr_t RunningMark = 0x103;
+constexpr std::uintptr_t EndedMark = 0x104;
+
+bool IsNative(const std::string& path) {
+    return path.starts_with("native/");
+}
+
+/// Of the native driver's pipes; a file of the other one gets its endpoint later.
+std::uint32_t PipeOf(const std::string& path) {
+    const std::string suffix = Protocol::NativeDriver::PipeSuffix;
+    const std::size_t at = path.rfind(suffix);
+    return at == std::string::npos ? 0 : static_cast<std::uint32_t>(path.at(at + suffix.size()) - '0');
+}
+
+std::string Line(const char* what, std::uint32_t number) {
+    char text[32];
+    std::snprintf(text, sizeof text, "%s %X", what, number);
+    return text;
+}
+std::string Sent(const void* bytes, std::uint32_t size) {
+    return size == 0 ? "" : " " + Hex(static_cast<const std::uint8_t*>(bytes), size);
+}
+std::string Room(std::uint32_t bytes) {
+    return " [" + std::to_string(bytes) + "]";
+}
+
+Answer UsualAnswer(std::uint32_t code, std::uint32_t room) {
+    switch (code) {
+        case UsbIoControl::GetDriverInfo:
+            return {.data = {0x30, 0x02, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0}};
+        case UsbIoControl::GetDeviceParameters:
+            return {.data = {0x11, 0, 0, 0, 0x22, 0, 0, 0}};
+        default:
+            return {.data = Bytes(room)};
+    }
+}
+
+}  // namespace
+
+ScriptedDriver::ScriptedDriver(std::vector<std::string> devicePaths) : paths(std::move(devicePaths)) {}
+
+ScriptedDriver::~ScriptedDriver() {
+    for (const EventScheduler::EventId event : events) {
+        ClockScheduler().Forget(event);
+    }
+}
+
+void ScriptedDriver::Script(std::uint32_t place, Answer answer) {
+    const std::lock_guard held(lock);
+    scripts[place].push_back(std::move(answer));
+}
+
+void ScriptedDriver::DropScript(std::uint32_t place) {
+    const std::lock_guard held(lock);
+    scripts[place].clear();
+}
+
+void ScriptedDriver::RefuseOpen(const std::string& path, ErrorCode code) {
+    const std::lock_guard held(lock);
+    refusals[path] = code;
+}
+
+void ScriptedDriver::BeforeOpen(const std::string& path, std::function<void()> action) {
+    const std::lock_guard held(lock);
+    openActions[path] = std::move(action);
+}
+
+bool ScriptedDriver::CompleteAs(std::uint32_t place, const Answer* answer) {
+    std::uint64_t number = 0;
+    ErrorCode code = Errors::Success;
+    {
+        const std::lock_guard held(lock);
+        const auto oldest = std::ranges::find(running, place, &Transfer::place);
+        if (oldest == running.end()) {
+            return false;
+        }
+        if (answer) {
+            oldest->answer = *answer;
+        }
+        number = oldest->number;
+        code = oldest->answer.code;
+    }
+    End(number, code, true);
+    return true;
+}
+
+std::vector<std::string> ScriptedDriver::TakeTranscript() {
+    const std::lock_guard held(lock);
+    return std::exchange(transcript, {});
+}
+
+std::vector<std::string> ScriptedDriver::TakeTransfers() {
+    std::vector<std::string> lines = TakeTranscript();
+    std::erase_if(
+        lines, [](const std::string& line) { return line.starts_with("open") || line.starts_with("close"); });
+    return lines;
+}
+
+std::size_t ScriptedDriver::OpenFiles() const {
+    const std::lock_guard held(lock);
+    return static_cast<std::size_t>(
+        std::ranges::count_if(files, [](const auto& file) { return file->isOpen; }));
+}
+
+std::size_t ScriptedDriver::RunningTransfers() const {
+    const std::lock_guard held(lock);
+    return running.size();
+}
+
+std::size_t ScriptedDriver::Running(std::uint32_t place) const {
+    const std::lock_guard held(lock);
+    return static_cast<std::size_t>(std::ranges::count(running, place, &Transfer::place));
+}
+
+std::uint64_t ScriptedDriver::BytesIn(std::uint32_t place) const {
+    const std::lock_guard held(lock);
+    const auto found = bytesIn.find(place);
+    return found == bytesIn.end() ? 0 : found->second;
+}
+
+std::size_t ScriptedDriver::MostControlsAtOnce() const {
+    const std::lock_guard held(lock);
+    return mostControls;
+}
+
+std::vector<std::string> ScriptedDriver::ListInterfaces(const Protocol::Guid& interfaceClass) {
+    std::vector<std::string> listed;
+    std::ranges::copy_if(paths, std::back_inserter(listed), [&](const std::string& path) {
+        return interfaceClass == (IsNative(path) ? Protocol::NativeDriver::InterfaceClass
+                                                 : Protocol::UsbIoDriver::InterfaceClass);
+    });
+    return listed;
+}
+
+Handle ScriptedDriver::Open(const std::string& path) {
+    std::function<void()> action;
+    {
+        const std::lock_guard held(lock);
+        if (const auto found = openActions.find(path); found != openActions.end()) {
+            action = found->second;
+        }
+    }
+    if (action) {
+        action();
+    }
+    ErrorCode refusal = Errors::Success;
+    Handle opened = InvalidHandle();
+    {
+        const std::lock_guard held(lock);
+        if (const auto refused = refusals.find(path); refused != refusals.end()) {
+            refusal = refused->second;
+        } else {
+            transcript.push_back("open " + path);
+            files.push_back(std::make_unique<File>(File{path, PipeOf(path)}));
+            opened = files.back().get();
+        }
+    }
+    SetLastError(refusal);
+    return opened;
+}
+
+ScriptedDriver::File* ScriptedDriver::Find(Handle handle) {
+    {
+        const std::lock_guard held(lock);
+        for (const std::unique_ptr<File>& file : files) {
+            if (file.get() == handle && file->isOpen) {
+                return file.get();
+            }
+        }
+    }
+    SetLastError(Errors::InvalidHandle);
+    return nullptr;
+}
+
+bool ScriptedDriver::CloseFile(Handle handle) {
+    File* const file = Find(handle);
+    if (!file) {
+        return false;
+    }
+    {
+        const std::lock_guard held(lock);
+        file->isOpen = false;
+        transcript.push_back("close " + file->path);
+    }
+    EndAll(*file);
+    return true;
+}
+
+bool ScriptedDriver::StartRead(Handle handle, void* buffer, std::uint32_t length, Overlapped& record) {
+    const File* const file = Find(handle);
+    return file && Start(*file, 0, Line("read", file->place) + Room(length),
+                         static_cast<std::uint8_t*>(buffer), length, {.after = Never}, record);
+}
+
+bool ScriptedDriver::StartWrite(Handle handle, const void* buffer, std::uint32_t length, Overlapped& record) {
+    const File* const file = Find(handle);
+    return file &&
+           Start(*file, 0, Line("write", file->place) + Sent(buffer, length), nullptr, length, {}, record);
+}
+
+bool ScriptedDriver::StartControl(Handle handle, std::uint32_t code, const void* input,
+                                  std::uint32_t inputSize, void* output, std::uint32_t outputSize,
+                                  Overlapped& record) {
+    File* const file = Find(handle);
+    if (!file) {
+        return false;
+    }
+    const auto* const bytes = static_cast<const std::uint8_t*>(input);
+    const bool isInward = IsNative(file->path)
+                              ? bytes[Protocol::NativeDriver::Block::Direction] != 0
+                              : outputSize > 0 && code != UsbIoControl::ClassOrVendorOutRequest;
+    const bool completed = Start(*file, code,
+                                 Line("control", code) + Sent(input, inputSize) + " /" +
+                                     (isInward ? Room(outputSize) : Sent(output, outputSize)),
+                                 isInward ? static_cast<std::uint8_t*>(output) : nullptr, outputSize,
+                                 UsualAnswer(code, outputSize), record);
+    if (completed && code == UsbIoControl::BindPipe) {
+        file->place = bytes[0];
+    }
+    if (completed && code == UsbIoControl::AbortPipe) {
+        EndAll(*file);
+    }
+    return completed;
+}
+
+Answer ScriptedDriver::TakeAnswer(std::uint32_t place, std::uint32_t code, const Answer& usual) {
+    const std::lock_guard held(lock);
+    for (const std::uint32_t key : {code == 0 ? place : code, place}) {
+        if (std::deque<Answer>& script = scripts[key]; !script.empty()) {
+            Answer answer = std::move(script.front());
+            script.pop_front();
+            return answer;
+        }
+    }
+    return usual;
+}
+
+bool ScriptedDriver::Start(const File& file, std::uint32_t code, std::string line, std::uint8_t* target,
+                           std::uint32_t length, const Answer& usual, Overlapped& record) {
+    const std::uint32_t place = code == 0 ? file.place : 0;
+    {
+        const std::lock_guard held(lock);
+        transcript.push_back(std::move(line));
+    }
+    const Answer answer = TakeAnswer(place, code, usual);
+    if (answer.onStart) {
+        answer.onStart();
+    }
+    if (answer.refusal != Errors::Success) {
+        SetLastError(answer.refusal);
+        return false;
+    }
+    Wait(record.event, 0);  // resets it
+    if (answer.completesThrough != NoHandle) {
+        record.event = answer.completesThrough;
+    }
+    std::uint64_t number = 0;
+    {
+        const std::lock_guard held(lock);
+        number = ++lastNumber;
+        record.internal = RunningMark;
+        record.internalHigh = 0;
+        running.push_back(
+            {number, &file, place, &record, target, length, std::this_thread::get_id(), answer});
+        mostControls = std::max(mostControls,
+                                static_cast<std::size_t>(std::ranges::count(running, 0U, &Transfer::place)));
+    }
+    if (answer.after == 0) {
+        End(number, answer.code, true);
+    } else if (answer.after != Never) {
+        EndLater(number, std::uint64_t{answer.after} * 1000, answer.code, true);
+    }
+    const bool completed = answer.after == 0 && answer.code == Errors::Success;
+    SetLastError(completed ? Errors::Success : Errors::IoPending);
+    return completed;
+}
+
+void ScriptedDriver::EndLater(std::uint64_t number, std::uint64_t microseconds, ErrorCode code,
+                              bool withData) {
+    const EventScheduler::EventId event =
+        ClockScheduler().CallAt(ClockScheduler().Now() + microseconds,
+                                [this, number, code, withData] { End(number, code, withData); });
+    const std::lock_guard held(lock);
+    events.push_back(event);
+}
+
+void ScriptedDriver::End(std::uint64_t number, ErrorCode code, bool withData) {
+    Handle event = NoHandle;
+    {
+        const std::lock_guard held(lock);
+        const auto found = std::ranges::find(running, number, &Transfer::number);
+        if (found == running.end()) {
+            return;
+        }
+        std::size_t moved = withData ? found->length : 0;
+        if (found->target) {
+            moved = std::min(moved, found->answer.data.size());
+            std::copy_n(found->answer.data.begin(), moved, found->target);
+            bytesIn[found->place] += moved;
+        }
+        found->record->internalHigh = found->answer.count.value_or(static_cast<std::uint32_t>(moved));
+        found->record->offset = code;
+        found->record->internal = EndedMark;
+        event = found->record->event;
+        running.erase(found);
+    }
+    SignalEvent(event);
+}
+
+void ScriptedDriver::EndAll(const File& file) {
+    std::vector<std::uint64_t> numbers;
+    {
+        const std::lock_guard held(lock);
+        for (const Transfer& transfer : running) {
+            if (transfer.file == &file) {
+                numbers.push_back(transfer.number);
+            }
+        }
+    }
+    for (const std::uint64_t number : numbers) {
+        End(number, Errors::OperationAborted, false);
+    }
+}
+
+bool ScriptedDriver::GetResult(Handle, Overlapped& record, std::uint32_t& transferred, bool wait) {
+    for (;;) {
+        {
+            const std::lock_guard held(lock);
+            if (record.internal != RunningMark) {
+                const bool hasEnded = record.internal == EndedMark;  // and not: was never started
+                transferred = static_cast<std::uint32_t>(record.internalHigh);
+                const ErrorCode code = hasEnded ? record.offset : Errors::InvalidParameter;
+                SetLastError(code);
+                return code == Errors::Success;
+            }
+        }
+        if (!wait) {
+            SetLastError(Errors::IoIncomplete);
+            return false;
+        }
+        SleepMilliseconds(1);
+    }
+}
+
+bool ScriptedDriver::CancelTransfers(Handle handle) {
+    std::vector<Transfer> cancelled;
+    {
+        const std::lock_guard held(lock);
+        for (Transfer& transfer : running) {
+            if (transfer.file == handle && transfer.starter == std::this_thread::get_id() &&
+                !std::exchange(transfer.isCancelled, true)) {
+                cancelled.push_back(transfer);
+            }
+        }
+        if (!cancelled.empty()) {
+            transcript.push_back(Line("cancel", cancelled.front().place));
+        }
+    }
+    for (const Transfer& transfer : cancelled) {
+        const Answer& answer = transfer.answer;
+        if (answer.cancelledAfter == 0) {
+            End(transfer.number, answer.cancelledWith, answer.cancelledWithData);
+        } else if (answer.cancelledAfter != Never) {
+            // Between two looks of a waiting `GetResult`.
+            EndLater(transfer.number, std::uint64_t{answer.cancelledAfter} * 1000 - 500, answer.cancelledWith,
+                     answer.cancelledWithData);
+        }
+    }
+    return true;
+}
+
+}  // namespace Varnholt::Tests
