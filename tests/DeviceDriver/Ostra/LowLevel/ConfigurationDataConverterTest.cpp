@@ -87,16 +87,5 @@ TEST(ConfigurationDataConverter, EveryIdentifierHasItsDefaultOrNone) {
     }
 }
 
-TEST(ConfigurationDataConverter, ConvertsBigEndian) {
-    Property entry = ConfigurationDataConverter::GetDefaultProperty(1000);
-    ConfigurationDataConverter::ByteArrayToConfigurationDataEntry({0xBF, 0x80, 0, 0, 0x3F, 0x80, 0, 0},
-                                                                  entry);
-    EXPECT_EQ(entry.AsFloatVector(), (std::vector<float>{-1.0F, 1.0F}));
-    EXPECT_EQ(entry.GetType(), TypeFloatVector);
-    std::vector<std::uint8_t> bytes{1, 2, 3};
-    ConfigurationDataConverter::ConfigurationDataEntryToByteArray(Property(std::int32_t{-2}), bytes);
-    EXPECT_EQ(bytes, (std::vector<std::uint8_t>{0xFF, 0xFF, 0xFF, 0xFE}));
-}
-
 }  // namespace
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -13,8 +13,8 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 using Bytes = std::vector<std::uint8_t>;
 
-/// One command as it reached the fake; for commands other than EEPROM ones `address` and `size` are 0 or the
-/// command's numbers.
+/// One command as it reached the fake; for commands that have neither address nor size, what number they
+/// have.
 struct Command {
     std::string name;
     std::uint32_t address = 0;
@@ -25,22 +25,21 @@ void PrintTo(const Command& command, std::ostream* stream);
 
 /// What the fake instrument keeps, and how it misbehaves; owned by the test.
 struct FakeInstrument {
-    Bytes eeprom;
-    std::vector<Command> commands;
+    Bytes eeprom{};
+    std::vector<Command> commands{};
 
     std::uint16_t p1 = 0, p2 = 0, p3 = 0;
     std::uint8_t p4 = 0, p5 = 0;
     std::uint8_t misc1 = 0, misc3 = 0;
     std::uint16_t misc2 = 0, misc4 = 0, misc5 = 0;
     std::uint8_t mode = 0;
+    std::array<std::uint16_t, 3> cpld{};
+    Bytes scan{};  ///< what is left of it
     /// The six answers to `GetMeasureMode` in the current mode.
-    std::function<std::array<std::uint8_t, 6>(std::uint8_t mode)> describeMode;
+    std::function<std::array<std::uint8_t, 6>(std::uint8_t mode)> describeMode{};
 
-    /// The command with this index fails with `IOException`; a write has then written this part of its bytes.
+    /// The command with this index fails with `IOException`.
     std::size_t failingCommand = ~std::size_t{0};
-    std::uint32_t bytesWrittenByFailure = 0;
-    /// Every command behind the failing one fails as well, and nothing is written any more.
-    bool isGoneAfterFailure = false;
 
     std::vector<Command> TakeCommands();
 };

@@ -61,7 +61,7 @@ Values ValuesOf(PellandoEEPROM& eeprom) {
 }
 
 Values ValuesIn(const Bytes& image) {
-    FakeInstrument instrument{.eeprom = image, .commands = {}, .describeMode = {}};
+    FakeInstrument instrument{.eeprom = image};
     PellandoEEPROM eeprom(Open(instrument));
     return ValuesOf(eeprom);
 }
@@ -87,7 +87,7 @@ Property Resized(Property value, std::uint16_t elements) {
 }  // namespace
 
 ImageOutcome CheckImage(const Bytes& image, const std::vector<Resize>& resizes) {
-    FakeInstrument instrument{.eeprom = image, .commands = {}, .describeMode = {}};
+    FakeInstrument instrument{.eeprom = image};
     const auto functionality = Open(instrument);
     Varnholt::Utilities::Tools::SmartPointer<PellandoEEPROM> eeprom;
     if (!Succeeds("load", [&] {

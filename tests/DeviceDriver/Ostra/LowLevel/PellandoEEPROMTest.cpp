@@ -7,6 +7,7 @@
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
 #include "FakeCommands.h"
+#include "ImageCheck.h"
 #include "Protocol/ByteOrder.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
@@ -48,6 +49,10 @@ class EepromTest : public testing::Test {
             set.SetProperty(id, Long(value));
         }
         eeprom->Store(set);
+    }
+    void ExpectLocked() {
+        EXPECT_THAT([&] { eeprom->Lock(); },
+                    ThrowsMessage<ResourceException>(StrEq("EEPROM already locked")));
     }
 
     FakeInstrument instrument;
@@ -136,33 +141,28 @@ TEST_F(EepromTest, StoreObeysItsRequests) {
         EXPECT_THAT(instrument.TakeCommands(),
                     ElementsAreArray(row.writesLog ? LogWrites : std::vector<Command>()));
         EXPECT_EQ(set.Contains(20001) ? set.GetProperty(20001).AsLong() : -1, row.writeThroughAfterwards);
-        EXPECT_THAT([&] { eeprom->Lock(); },
-                    ThrowsMessage<ResourceException>(StrEq("EEPROM already locked")));
+        ExpectLocked();
+    }
+    Store({{10002, 5}, {20002, 1}});
+    for (const std::size_t copy : {0U, 2048U}) {
+        EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[copy]), 5U);
+        EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[copy + 8]), 5U);
     }
     EXPECT_EQ(eeprom->Load(1211).AsLong(), 5);
     EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[4708]), 0xFFFFFFFF)
         << "calibration changes in memory only";
 }
 
-TEST_F(EepromTest, LogValuesReachBothCopies) {
-    Load();
-    Store({{10002, 5}, {20002, 1}});
-    for (const std::size_t copy : {0U, 2048U}) {
-        EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[copy]), 5U);
-        EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[copy + 8]), 5U);
-    }
-}
-
 TEST_F(EepromTest, FailedWriteThroughLocksAgain) {
     Load();
     instrument.failingCommand = 0;
     EXPECT_THAT([&] { Store({{20001, 1}}); }, testing::Throws<IOException>());
-    EXPECT_THAT([&] { eeprom->Lock(); }, ThrowsMessage<ResourceException>(StrEq("EEPROM already locked")));
+    ExpectLocked();
 }
 
 TEST_F(EepromTest, LockGuardsWriteThrough) {
     Load();
-    EXPECT_THAT([&] { eeprom->Lock(); }, ThrowsMessage<ResourceException>(StrEq("EEPROM already locked")));
+    ExpectLocked();
     EXPECT_THAT([&] { eeprom->WriteThrough(); },
                 ThrowsMessage<ResourceException>(StrEq("EEPROM access denied")));
     EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
@@ -259,44 +259,25 @@ TEST_F(EepromTest, DumpOfAFreshInstrumentIsTheFreshImage) {
     EXPECT_EQ(Protocol::LoadBig32(&image[2048 + 8]), 20U);
 }
 
-TEST_F(EepromTest, DumpOfValuesThatChangedTheirSizeReadsBackRight) {
-    struct Case {
+TEST(EepromImages, ValuesThatChangedTheirSizeReadBackRight) {
+    const struct {
         const char* name;
-        std::uint16_t id;
-        Property value;
+        Resize resize;
+        ImageOutcome outcome = ImageOutcome::RoundTripRight;
+    } cases[] = {
+        {"in the middle", {3009, 3}},
+        {"the last value", {3013, 2}},
+        {"the first value", {1000, 40}},
+        {"shorter", {1002, 1}},
+        {"empty", {3011, 0}},
+        {"as long as fits", {3013, 860}},
+        {"longer", {3013, 861}, ImageOutcome::DumpRefused},
+        {"log in the middle", {10011, 130}},
+        {"log at the end", {10021, 2}},
+        {"log, shorter", {10010, 2}},
     };
-    for (const Case& row : {
-             Case{"in the middle", 3009, Property(Longs{1, 2, 3})},
-             Case{"the last value", 3013, Property(Longs{7, 8})},
-             Case{"the first value", 1000, Property(std::vector<float>(40, 2.5F))},
-             Case{"shorter", 1002, Property(Longs{5})},
-             Case{"empty", 3011, Property(Longs{})},
-             Case{"as long as fits", 3013, Property(Longs(860, 9))},
-             Case{"log in the middle", 10011, Property(Longs(130, 6))},
-             Case{"log at the end", 10021, Property(Longs{3, 4})},
-             Case{"log, shorter", 10010, Property(Longs(2, 4))},
-         }) {
-        SCOPED_TRACE(row.name);
-        Load();
-        eeprom->SetProperty(row.id, row.value);
-        Bytes image = eeprom->Dump();
-        Properties calibration("CalibrationData"), log("LogData");
-        eeprom->Load(calibration);
-        eeprom->Load(log);
-        for (const bool mainLogBroken : {false, true}) {
-            image[0] = static_cast<std::uint8_t>(mainLogBroken ? ~image[0] : image[0]);
-            FakeInstrument written;
-            written.eeprom = image;
-            PellandoEEPROM again(Open(written));
-            for (const Properties* expected : {&calibration, &log}) {
-                for (const auto& [id, value] : expected->GetDatastore()) {
-                    EXPECT_EQ(again.Load(id).AsByteVector(true), value.AsByteVector(true))
-                        << id << mainLogBroken;
-                }
-            }
-        }
-        eeprom.reset();
-        instrument.eeprom = FreshImage();
+    for (const auto& row : cases) {
+        EXPECT_EQ(CheckImage(FreshImage(), {row.resize}), row.outcome) << row.name;
     }
 }
 
@@ -330,14 +311,7 @@ TEST_F(EepromTest, DumpRefusesWhatCannotBeReadBack) {
     }
 }
 
-TEST_F(EepromTest, DestructorWritesTheLogTwicePieceByPiece) {
-    Load();
-    eeprom.reset();
-    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
-    EXPECT_EQ(instrument.eeprom, FreshImage());
-}
-
-TEST_F(EepromTest, DestructorReportsALogThatIsLost) {
+TEST_F(EepromTest, DestructorWritesTheLogTwiceOrReportsThatItIsLost) {
     for (const bool reported : {true, false}) {
         Load();
         std::string reason;
@@ -356,6 +330,8 @@ TEST_F(EepromTest, DestructorReportsALogThatIsLost) {
     Load();
     eeprom->ReportLostLog([](const std::string&) { ADD_FAILURE() << "nothing was lost"; });
     eeprom.reset();
+    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
+    EXPECT_EQ(instrument.eeprom, FreshImage());
 }
 
 TEST_F(EepromTest, LogThatOutgrowsItsAreaNeverReachesTheTable) {
