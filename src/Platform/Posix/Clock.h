@@ -12,6 +12,7 @@
 namespace Varnholt::Platform::Posix {
 
 class BlockedCall;
+class CompletionSource;
 class ThreadRecord;
 class WaitableObject;
 
@@ -48,6 +49,8 @@ class KernelHold final : private std::unique_lock<std::mutex> {
     /// Of whoever has the lock: rings when it is let go of. Rung at once, the bell would wake a thread only
     /// for it to wait for the lock.
     static void RingOnRelease(const Bell& bell);
+    /// The same for a thread that works off `source`.
+    static void InterruptOnRelease(const std::shared_ptr<CompletionSource>& source);
 
   private:
     static void RingKept();

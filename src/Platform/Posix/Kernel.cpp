@@ -14,7 +14,23 @@ namespace Varnholt::Platform::Posix {
 namespace {
 
 std::mutex kernelLock;
-Immortal<Bell> bellToRing;  // when the lock is let go of; guarded by it
+
+/// Whoever is to be woken when the lock is let go of; guarded by it.
+struct Wakeup {
+    Bell bell;
+    std::shared_ptr<CompletionSource> source;
+
+    void Happen() const {
+        if (bell) {
+            bell->notify_one();
+        }
+        if (source) {
+            source->Interrupt();
+        }
+    }
+};
+Immortal<Wakeup> keptWakeup;
+
 std::atomic<Clock*> installedClock = nullptr;
 std::atomic<std::uint32_t> threadCount = 0;
 
@@ -69,22 +85,23 @@ KernelHold::~KernelHold() {
 }
 
 void KernelHold::unlock() {
-    const Bell bell = std::exchange(*bellToRing, nullptr);
+    const Wakeup wakeup = std::exchange(*keptWakeup, {});
     std::unique_lock<std::mutex>::unlock();
-    if (bell) {
-        bell->notify_one();
-    }
+    wakeup.Happen();
 }
 
 void KernelHold::RingOnRelease(const Bell& bell) {
     RingKept();  // one place is enough: hardly anybody wakes two
-    *bellToRing = bell;
+    (*keptWakeup).bell = bell;
+}
+
+void KernelHold::InterruptOnRelease(const std::shared_ptr<CompletionSource>& source) {
+    RingKept();
+    (*keptWakeup).source = source;
 }
 
 void KernelHold::RingKept() {
-    if (const Bell bell = std::exchange(*bellToRing, nullptr)) {
-        bell->notify_one();
-    }
+    std::exchange(*keptWakeup, {}).Happen();
 }
 
 ThreadRecord::ThreadRecord() : number(++threadCount) {}
@@ -95,6 +112,10 @@ ThreadRecord& CurrentThread() {
         endOfThread.Watch(*currentThread);
     }
     return *currentThread;
+}
+
+bool IsCurrentThread(const ThreadRecord& thread) {
+    return &thread == currentThread;
 }
 
 ThreadRecord* BindCurrentThread(ThreadRecord* thread) {
@@ -108,6 +129,10 @@ void AbandonOwned(ThreadRecord& thread) {
     for (const auto& mutex : abandoned) {
         mutex->Abandon();
     }
+}
+
+void WorkOffInWaits(const std::weak_ptr<CompletionSource>& source) {
+    CurrentThread().source = source;
 }
 
 Clock& CurrentClock() {

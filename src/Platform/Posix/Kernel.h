@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "Platform/Posix/Clock.h"
+#include "Platform/Posix/CompletionSource.h"
 
 /// The part of the platform that Windows keeps in its kernel: objects that threads wait for.
 ///
@@ -25,14 +26,17 @@ class ThreadRecord final {
 
     const std::uint32_t number;  ///< for messages
 
-    // All guarded by the kernel lock, except the last three, which only the thread itself uses.
+    // Guarded by the kernel lock.
     const Bell turn = std::make_shared<std::condition_variable>();
     std::vector<std::shared_ptr<MutexObject>> owned;
+
+    // Only the thread itself uses these.
     int priority = 0;
     int niceShift = 0;  ///< what the priority has changed of the thread's nice value
     unsigned sectionsHeld = 0;
+    std::weak_ptr<CompletionSource> source;  ///< worked off in its waits
 
-    // For the virtual clock.
+    // For the virtual clock, guarded by the kernel lock.
     enum class State {
         Unknown,  ///< not one of the clock's threads
         Ready,
@@ -48,6 +52,7 @@ class ThreadRecord final {
 
 /// The calling thread's record.
 ThreadRecord& CurrentThread();
+bool IsCurrentThread(const ThreadRecord& thread);
 /// Binds `thread` to the calling thread until it ends or null is bound; answers what was bound before.
 ThreadRecord* BindCurrentThread(ThreadRecord* thread);
 
@@ -63,7 +68,9 @@ class BlockedCall {
 
     ThreadRecord& thread;
     bool woken = false;
-    bool hopeless = false;  ///< the virtual clock found that nothing can ever end the call
+    bool hopeless = false;    ///< the virtual clock found that nothing can ever end the call
+    bool mayWorkOff = false;  ///< a completion source, as long as it blocks
+    std::shared_ptr<CompletionSource> worksOff;  ///< the source, while it does
 
     /// For the report of a deadlock: what is waited for.
     virtual std::string Describe() const = 0;

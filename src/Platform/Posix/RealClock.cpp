@@ -41,7 +41,23 @@ EventScheduler& RealClock::Scheduler() {
     return RealScheduler::Instance();
 }
 
+/// False when there is nothing that the thread can work off.
+bool RealClock::WorkOff(KernelHold& hold, BlockedCall& call, Microseconds deadline) {
+    auto source = call.mayWorkOff ? call.thread.source.lock() : nullptr;
+    if (!source || !source->TryEnter()) {
+        return false;
+    }
+    call.worksOff = source;
+    hold.unlock();
+    source->WorkOff(deadline);
+    hold.lock();
+    call.worksOff = nullptr;
+    return true;
+}
+
 void RealClock::Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) {
+    while (!call.woken && Now() < deadline && WorkOff(hold, call, deadline)) {
+    }
     const auto woken = [&call] { return call.woken; };
     if (deadline == Never) {
         hold.Wait(*call.thread.turn, woken);
@@ -53,7 +69,11 @@ void RealClock::Block(KernelHold& hold, BlockedCall& call, Microseconds deadline
 
 void RealClock::Wake(BlockedCall& call) {
     call.woken = true;
-    KernelHold::RingOnRelease(call.thread.turn);
+    if (!call.worksOff) {
+        KernelHold::RingOnRelease(call.thread.turn);
+    } else if (!IsCurrentThread(call.thread)) {
+        KernelHold::InterruptOnRelease(call.worksOff);
+    }
 }
 
 void RealClock::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,

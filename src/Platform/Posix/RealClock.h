@@ -24,6 +24,9 @@ class RealClock final : public Clock {
     void ThreadBegins(KernelHold& /*hold*/, ThreadRecord& /*thread*/) override {}
     void ThreadEnds(KernelHold& /*hold*/, ThreadRecord& /*thread*/) override {}
     void ThreadNeverBegan(KernelHold& /*hold*/, ThreadRecord& /*thread*/) override {}
+
+  private:
+    static bool WorkOff(KernelHold& hold, BlockedCall& call, Microseconds deadline);
 };
 
 }  // namespace Varnholt::Platform::Posix

@@ -1,5 +1,6 @@
 #include "Platform/Posix/RealScheduler.h"
 
+#include <sched.h>
 #include <sys/prctl.h>
 
 #include <algorithm>
@@ -14,6 +15,17 @@ namespace {
 
 constexpr Microseconds LongestStep = 3'600'000'000;
 
+/// How long after a waiting thread has called an event the own thread leaves events to the next wait.
+constexpr Microseconds Patience = 2'000;
+
+/// The system ends a sleep up to this much late. A thread that waits for what an event does spends the rest
+/// awake: it is the one that is in a hurry.
+constexpr Microseconds SleepSlack = 100;
+
+std::chrono::steady_clock::time_point At(Microseconds time) {
+    return std::chrono::steady_clock::time_point(std::chrono::microseconds(time));
+}
+
 }  // namespace
 
 EventScheduler::EventId NewEventId() {
@@ -22,8 +34,8 @@ EventScheduler::EventId NewEventId() {
 }
 
 RealScheduler& RealScheduler::Instance() {
-    static RealScheduler scheduler;
-    return scheduler;
+    static const auto scheduler = std::make_shared<RealScheduler>();
+    return *scheduler;
 }
 
 RealScheduler::~RealScheduler() {
@@ -45,8 +57,14 @@ EventScheduler::EventId RealScheduler::CallAt(std::uint64_t time, std::function<
     const auto place = events.emplace(std::pair(time, id), std::move(event)).first;
     if (threadState == ThreadState::None) {
         StartThread();
-    } else if (place == events.begin()) {
-        changed.notify_all();
+    }
+    if (place == events.begin()) {
+        (waiterEntered ? waitersTurn : threadsTurn).notify_one();
+    }
+    const bool isAnEventsOwn = running != 0 && runner == std::this_thread::get_id();
+    hold.unlock();
+    if (!isAnEventsOwn) {
+        WorkOffInWaits(weak_from_this());
     }
     return id;
 }
@@ -60,10 +78,10 @@ void RealScheduler::Forget(EventId id) {
         dropped = std::move(found->second);
         events.erase(found);
     }
-    if (threadState == ThreadState::Running && pthread_equal(thread, pthread_self())) {
+    if (running != 0 && runner == std::this_thread::get_id()) {
         return;  // from inside an event
     }
-    changed.wait(hold, [this, id] { return running != id; });
+    callEnded.wait(hold, [this, id] { return running != id; });
     if (events.empty() && running == 0) {
         WaitForEnd(hold);
     }
@@ -89,27 +107,79 @@ void* RealScheduler::RunThread(void* scheduler) {
 void RealScheduler::CallEvents() {
     Hold hold(lock);
     while (!events.empty()) {
-        const auto next = events.begin();
-        const Microseconds time = next->first.first;
-        if (time > Now()) {
-            // A time so far off that the system's clock could not hold it is approached in steps.
-            const Microseconds step = std::min(time, Now() + LongestStep);
-            const std::chrono::steady_clock::time_point then{std::chrono::microseconds(step)};
-            changed.wait_until(hold, then);
-            continue;
+        const Microseconds now = Now();
+        Microseconds time = std::max(events.begin()->first.first, leftToWaiters);
+        if (waiterEntered) {
+            time = std::max(time, now + Patience);
         }
-        running = next->first.second;
-        std::function<void()> event = std::move(next->second);
-        events.erase(next);
-        hold.unlock();
-        event();
-        event = nullptr;
-        hold.lock();
-        running = 0;
-        changed.notify_all();
+        if (time > now) {
+            // A time so far off that the system's clock could not hold it is approached in steps.
+            threadsTurn.wait_until(hold, At(std::min(time, now + LongestStep)));
+        } else {
+            CallNext(hold);
+        }
     }
     threadState = ThreadState::Ended;
-    changed.notify_all();
+    callEnded.notify_all();
+}
+
+void RealScheduler::CallNext(Hold& hold) {
+    const auto next = events.begin();
+    running = next->first.second;
+    runner = std::this_thread::get_id();
+    std::function<void()> event = std::move(next->second);
+    events.erase(next);
+    hold.unlock();
+    event();
+    event = nullptr;
+    hold.lock();
+    running = 0;
+    callEnded.notify_all();
+    if (events.empty()) {
+        threadsTurn.notify_one();
+    }
+}
+
+bool RealScheduler::TryEnter() {
+    const Hold hold(lock);
+    if (waiterEntered || running != 0 || events.empty()) {
+        return false;
+    }
+    waiterEntered = true;
+    interrupted = false;
+    return true;
+}
+
+void RealScheduler::WorkOff(Microseconds deadline) {
+    Hold hold(lock);
+    while (!interrupted && !events.empty()) {
+        const Microseconds now = Now();
+        const Microseconds time = events.begin()->first.first;
+        if (now >= time) {
+            CallNext(hold);
+            break;
+        }
+        if (now >= deadline) {
+            break;
+        }
+        const Microseconds end = std::min({time, deadline, now + LongestStep});
+        if (end - now > SleepSlack) {
+            waitersTurn.wait_until(hold, At(end - SleepSlack));
+        } else {
+            hold.unlock();
+            sched_yield();
+            hold.lock();
+        }
+    }
+    waiterEntered = false;
+    leftToWaiters = Now() + Patience;
+    hold.unlock();
+}
+
+void RealScheduler::Interrupt() {
+    const Hold hold(lock);
+    interrupted = true;
+    waitersTurn.notify_one();
 }
 
 void RealScheduler::JoinEndedThread(Hold& hold) {
@@ -124,8 +194,8 @@ void RealScheduler::JoinEndedThread(Hold& hold) {
 }
 
 void RealScheduler::WaitForEnd(Hold& hold) {
-    changed.notify_all();
-    changed.wait(hold, [this] { return threadState != ThreadState::Running || !events.empty(); });
+    threadsTurn.notify_one();
+    callEnded.wait(hold, [this] { return threadState != ThreadState::Running || !events.empty(); });
     JoinEndedThread(hold);
 }
 

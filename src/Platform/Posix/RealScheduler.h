@@ -4,18 +4,23 @@
 
 #include <condition_variable>
 #include <map>
+#include <memory>
 #include <mutex>
+#include <thread>
 #include <utility>
 
-#include "Platform/Posix/Clock.h"
+#include "Platform/Posix/CompletionSource.h"
 
 namespace Varnholt::Platform::Posix {
 
 /// Names events across all schedulers, so that an event of one is never taken for an event of another.
 EventScheduler::EventId NewEventId();
 
-/// Events in real time, called on a thread that exists while events wait.
-class RealScheduler final : public EventScheduler {
+/// Events in real time, called on a thread that exists while events wait, or on one that waits for what they
+/// do.
+class RealScheduler final : public EventScheduler,
+                            public CompletionSource,
+                            public std::enable_shared_from_this<RealScheduler> {
   public:
     static RealScheduler& Instance();
 
@@ -29,20 +34,31 @@ class RealScheduler final : public EventScheduler {
     EventId CallAt(std::uint64_t time, std::function<void()> event) override;
     void Forget(EventId id) override;
 
+    bool TryEnter() override;
+    void WorkOff(Microseconds deadline) override;
+    void Interrupt() override;
+
   private:
     using Hold = std::unique_lock<std::mutex>;
     static void* RunThread(void* scheduler);
     void CallEvents();
+    void CallNext(Hold& hold);
     void StartThread();
     void JoinEndedThread(Hold& hold);
     void WaitForEnd(Hold& hold);
 
     std::mutex lock;  // of everything below; nothing else is locked while it is held
-    std::condition_variable changed;
     std::map<std::pair<Microseconds, EventId>, std::function<void()>> events;
+    EventId running = 0;
+    std::thread::id runner;             // of the event that is running
+    std::condition_variable callEnded;  // an event's, or the thread's
+    std::condition_variable threadsTurn;
+    std::condition_variable waitersTurn;
     enum class ThreadState { None, Running, Ended } threadState = ThreadState::None;
     pthread_t thread{};
-    EventId running = 0;
+    bool waiterEntered = false;
+    bool interrupted = false;
+    Microseconds leftToWaiters = 0;  // the thread sleeps until then
 };
 
 }  // namespace Varnholt::Platform::Posix

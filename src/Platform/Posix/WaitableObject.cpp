@@ -22,6 +22,7 @@ class Waiter final : public BlockedCall {
             entry.waiter = this;
             objects[i]->Enqueue(entry);
         }
+        mayWorkOff = objects.size() == 1;  // who listens to several things waits for long, and is not urgent
     }
     ~Waiter() {
         for (std::size_t i = 0; i < objects.size(); ++i) {
