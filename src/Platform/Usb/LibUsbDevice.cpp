@@ -2,11 +2,9 @@
 
 #include <fcntl.h>
 #include <libusb-1.0/libusb.h>
-#include <signal.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <atomic>
 #include <cerrno>
 #include <chrono>
 #include <condition_variable>
@@ -15,6 +13,7 @@
 #include <vector>
 
 #include "Platform/Usb/LibUsbErrors.h"
+#include "Platform/Usb/LibUsbEvents.h"
 #include "Protocol/Instrument.h"
 
 namespace Varnholt::Platform::Usb {
@@ -41,25 +40,18 @@ struct Submission {
 
 class LibUsbDevice final : public UsbDevice {
   public:
-    LibUsbDevice(int deviceFile, libusb_context* ownContext, libusb_device_handle* openHandle)
-        : file(deviceFile), context(ownContext), handle(openHandle) {
-        // Signals are the host program's business: its own threads take them.
-        sigset_t all;
-        sigset_t before;
-        sigfillset(&all);
-        pthread_sigmask(SIG_SETMASK, &all, &before);
-        try {
-            events = std::thread([this] { HandleEvents(); });
-        } catch (...) {
-            pthread_sigmask(SIG_SETMASK, &before, nullptr);
-            CloseAll();
-            throw;
-        }
-        pthread_sigmask(SIG_SETMASK, &before, nullptr);
+    LibUsbDevice(int deviceFile, libusb_context* ownContext, libusb_device_handle* openHandle) try
+        : file(deviceFile),
+          context(ownContext),
+          handle(openHandle),
+          events(std::make_shared<LibUsbEvents>(ownContext)) {
+    } catch (...) {
+        CloseAll(deviceFile, ownContext, openHandle);
     }
 
     ~LibUsbDevice() override {
         {
+            events->HandleAlways();  // nobody needs to wait any more
             std::unique_lock lock(mutex);
             for (Submission* submission : running) {
                 libusb_cancel_transfer(submission->transfer);
@@ -67,10 +59,9 @@ class LibUsbDevice final : public UsbDevice {
             idle.wait(lock, [this] { return running.empty() && completing == 0; });
         }
         Release();
-        closing = true;
-        libusb_interrupt_event_handler(context);
-        events.join();
-        CloseAll();
+        events->Stop();
+        spare.clear();
+        CloseAll(file, context, handle);
     }
 
     std::vector<EndpointInfo> Endpoints() override;
@@ -85,15 +76,13 @@ class LibUsbDevice final : public UsbDevice {
   private:
     static void LIBUSB_CALL Completed(libusb_transfer* transfer);
     void Complete(Submission& submission);
-    void HandleEvents();
-    void CloseAll();
+    static void CloseAll(int file, libusb_context* context, libusb_device_handle* handle);
     std::unique_ptr<Submission> TakeSpare();
 
     const int file;
     libusb_context* const context;
     libusb_device_handle* const handle;
-    std::thread events;
-    std::atomic<bool> closing = false;
+    const std::shared_ptr<LibUsbEvents> events;
 
     std::mutex mutex;  // guards what follows; never held while a client is called
     std::condition_variable idle;
@@ -103,14 +92,7 @@ class LibUsbDevice final : public UsbDevice {
     bool claimed = false;
 };
 
-void LibUsbDevice::HandleEvents() {
-    while (!closing) {
-        libusb_handle_events(context);
-    }
-}
-
-void LibUsbDevice::CloseAll() {
-    spare.clear();
+void LibUsbDevice::CloseAll(int file, libusb_context* context, libusb_device_handle* handle) {
     libusb_close(handle);
     libusb_exit(context);
     close(file);
@@ -207,6 +189,9 @@ ErrorCode LibUsbDevice::Submit(Transfer& transfer) {
         }
     }
 
+    if (transfer.endpoint != Protocol::InterruptInEndpoint) {  // waited for at leisure
+        Posix::WorkOffInWaits(events);
+    }
     const std::lock_guard lock(mutex);
     running.reserve(running.size() + 1);
     spare.reserve(spare.size() + running.size() + 1);

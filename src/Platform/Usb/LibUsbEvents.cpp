@@ -1,0 +1,119 @@
+#include "Platform/Usb/LibUsbEvents.h"
+
+#include <libusb-1.0/libusb.h>
+#include <pthread.h>
+#include <signal.h>
+
+#include <algorithm>
+
+namespace Varnholt::Platform::Usb {
+namespace {
+
+using std::chrono::steady_clock;
+
+/// How long after a waiting thread has handled events the own thread leaves them to the next wait. What ends
+/// while nobody waits is noticed that much later.
+constexpr auto Patience = std::chrono::milliseconds(10);
+
+/// The longest stay in libusb; who waits comes back.
+constexpr auto LongestStay = std::chrono::seconds(60);
+
+/// Signals are the host program's business: its own threads take them.
+class SignalsBlocked final {
+  public:
+    SignalsBlocked() {
+        sigset_t all;
+        sigfillset(&all);
+        pthread_sigmask(SIG_SETMASK, &all, &before);
+    }
+    ~SignalsBlocked() { pthread_sigmask(SIG_SETMASK, &before, nullptr); }
+    SignalsBlocked(const SignalsBlocked&) = delete;
+    SignalsBlocked& operator=(const SignalsBlocked&) = delete;
+
+  private:
+    sigset_t before;
+};
+
+}  // namespace
+
+LibUsbEvents::LibUsbEvents(libusb_context* ownContext) : context(ownContext) {
+    const SignalsBlocked blocked;
+    thread = std::thread([this] { RunThread(); });
+}
+
+void LibUsbEvents::RunThread() {
+    std::unique_lock lock(mutex);
+    while (!stopping) {
+        if (!handlesAlways && (waiterHandles || steady_clock::now() < leftToWaiters)) {
+            changed.wait_until(lock, std::max(leftToWaiters, steady_clock::now() + Patience));
+            continue;
+        }
+        threadHandles = true;
+        lock.unlock();
+        libusb_handle_events(context);
+        lock.lock();
+        threadHandles = false;
+    }
+}
+
+void LibUsbEvents::HandleAlways() {
+    const std::lock_guard lock(mutex);
+    handlesAlways = true;
+    changed.notify_all();
+}
+
+void LibUsbEvents::Stop() {
+    std::unique_lock lock(mutex);
+    if (stopping) {
+        return;
+    }
+    stopping = true;
+    changed.notify_all();
+    libusb_interrupt_event_handler(context);
+    changed.wait(lock, [this] { return !waiterHandles; });
+    lock.unlock();
+    thread.join();
+}
+
+bool LibUsbEvents::TryEnter() {
+    const std::lock_guard lock(mutex);
+    if (waiterHandles || handlesAlways || stopping) {
+        return false;
+    }
+    waiterHandles = true;
+    interrupted = 0;
+    return true;
+}
+
+void LibUsbEvents::WorkOff(Posix::Microseconds deadline) {
+    const Posix::Microseconds now = Posix::CurrentClock().Now();
+    const auto longest = static_cast<Posix::Microseconds>(std::chrono::microseconds(LongestStay).count());
+    const Posix::Microseconds stay = std::min(deadline > now ? deadline - now : 0, longest);
+    timeval time{};
+    time.tv_sec = static_cast<time_t>(stay / 1'000'000);
+    time.tv_usec = static_cast<suseconds_t>(stay % 1'000'000);
+    {
+        const std::lock_guard lock(mutex);
+        if (threadHandles) {
+            libusb_interrupt_event_handler(context);  // makes room; libusb waits for that
+        }
+    }
+    libusb_handle_events_timeout_completed(context, &time, &interrupted);
+
+    const std::lock_guard lock(mutex);
+    waiterHandles = false;
+    leftToWaiters = steady_clock::now() + Patience;
+    if (stopping || handlesAlways) {
+        changed.notify_all();
+    }
+}
+
+void LibUsbEvents::Interrupt() {
+    const std::lock_guard lock(mutex);
+    interrupted = 1;
+    if (!stopping) {
+        libusb_interrupt_event_handler(context);
+    }
+}
+
+}  // namespace Varnholt::Platform::Usb

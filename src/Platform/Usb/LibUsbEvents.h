@@ -1,0 +1,51 @@
+#pragma once
+
+#include <chrono>
+#include <condition_variable>
+#include <mutex>
+#include <thread>
+
+#include "Platform/Posix/CompletionSource.h"
+
+struct libusb_context;
+
+namespace Varnholt::Platform::Usb {
+
+/// Handles the events of one libusb context: on a thread of its own, or on one that waits for a transfer.
+/// Only this object handles them, so that nobody else takes libusb's lock of events.
+class LibUsbEvents final : public Posix::CompletionSource {
+  public:
+    /// Throws std::system_error when no thread can be had. The context outlives the object's `Stop`.
+    explicit LibUsbEvents(libusb_context* ownContext);
+    ~LibUsbEvents() override { Stop(); }
+    LibUsbEvents(const LibUsbEvents&) = delete;
+    LibUsbEvents& operator=(const LibUsbEvents&) = delete;
+
+    /// The own thread no longer leaves the events to threads that may wait.
+    void HandleAlways();
+    /// Returns once no thread handles events, and none will.
+    void Stop();
+
+    bool TryEnter() override;
+    void WorkOff(Posix::Microseconds deadline) override;
+    void Interrupt() override;
+
+  private:
+    using Time = std::chrono::steady_clock::time_point;
+    void RunThread();
+
+    libusb_context* const context;
+    int interrupted = 0;  ///< read by libusb as well, between its own lock and its wait
+
+    std::mutex mutex;  ///< guards what follows
+    std::condition_variable changed;
+    bool threadHandles = false;
+    bool waiterHandles = false;
+    Time leftToWaiters{};  ///< the own thread sleeps until then
+    bool handlesAlways = false;
+    bool stopping = false;
+
+    std::thread thread;
+};
+
+}  // namespace Varnholt::Platform::Usb
