@@ -12,6 +12,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
+#include <memory>
 #include <string_view>
 #include <thread>
 #include <vector>
@@ -52,7 +53,7 @@ void LIBUSB_CALL Completed(libusb_transfer* transfer) {
 void Start(libusb_device_handle* device, Chunk& chunk, std::size_t length) {
     chunk.done = 0;
     libusb_fill_bulk_transfer(chunk.transfer, device, BulkInEndpoint, chunk.bytes.data(),
-                              static_cast<int>(length), &Completed, &chunk, Timeout);
+                              static_cast<int>(length), &Completed, &chunk, 0);
     if (const int code = libusb_submit_transfer(chunk.transfer)) {
         Fail("submit", code);
     }
@@ -60,7 +61,7 @@ void Start(libusb_device_handle* device, Chunk& chunk, std::size_t length) {
 
 void Scan(libusb_context* context, libusb_device_handle* device, std::size_t total) {
     static std::array<Chunk, 2> chunks;
-    std::vector<std::uint8_t> result(total);
+    const auto result = std::make_unique_for_overwrite<std::uint8_t[]>(total);
     Command(device, Request::Measure, {});
     std::size_t asked = 0;
     std::size_t received = 0;
@@ -80,7 +81,7 @@ void Scan(libusb_context* context, libusb_device_handle* device, std::size_t tot
             Fail("bulk transfer", LIBUSB_ERROR_IO);
         }
         const auto moved = static_cast<std::size_t>(chunk.transfer->actual_length);
-        std::copy_n(chunk.bytes.begin(), moved, result.begin() + static_cast<std::ptrdiff_t>(received));
+        std::copy_n(chunk.bytes.begin(), moved, result.get() + received);
         received += moved;
         const std::size_t length = std::min<std::size_t>(ChunkSize, total - asked);
         if (length > 0) {
