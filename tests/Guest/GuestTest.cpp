@@ -261,7 +261,7 @@ struct Comparison {
     double bare = 1e9;
 
     Comparison(const std::string& bareArguments, const std::function<double()>& secondsOfOurs) {
-        for (int round = 0; round < 5; ++round) {
+        for (int round = 0; round < 9; ++round) {
             const double seconds = BareSeconds(bareArguments);
             EXPECT_GT(seconds, 0);
             bare = std::min(bare, seconds);
