@@ -13,15 +13,21 @@ namespace {
 constexpr std::uint32_t Half = Protocol::EepromSize / 2;
 constexpr std::uint32_t ElementSize = 4;
 
+/// How far a write came.
+struct Advance {
+    bool begun = false;  ///< the EEPROM may differ from what it was: a piece that failed may be there in part
+    std::size_t sent = 0;  ///< pieces that the instrument has taken
+};
+
 void WritePieces(Session& session, Instrument& instrument, const EepromImage& wanted,
-                 const std::vector<WritePiece>& pieces, std::size_t& attempted) {
+                 const std::vector<WritePiece>& pieces, Advance& advance) {
     Progress progress = session.MakeProgress("writing", pieces.size(), "pieces");
     for (const WritePiece& piece : pieces) {
         session.UserInterruption().ThrowIfRequested();
-        ++attempted;
+        advance.begun = true;
         const auto bytes = std::span(wanted).subspan(piece.address, piece.length);
         instrument.Commands().WriteEEPROM(piece.address, {bytes.begin(), bytes.end()});
-        progress.Update(attempted);
+        progress.Update(++advance.sent);
     }
 }
 
@@ -83,18 +89,18 @@ void WriteEeprom(Session& session, Instrument& instrument, const EepromImage& wa
                  const std::vector<WritePiece>& pieces, const std::string& wayBack) {
     // Nothing is cut off in the middle: an interruption is looked for between two pieces.
     const Interruption::Deferral deferral(session.UserInterruption());
-    std::size_t attempted = 0;
+    Advance advance;
     try {
-        WritePieces(session, instrument, wanted, pieces, attempted);
+        WritePieces(session, instrument, wanted, pieces, advance);
         Verify(session, instrument, wanted);
     } catch (...) {
         const FailureReport report = session.Explain(std::current_exception());
-        if (attempted == 0) {
+        if (!advance.begun) {
             throw ToolFailure(report.code, report.message + "; nothing was written", report.advice);
         }
         throw ToolFailure(
             report.code,
-            fmt::format("{}; {} of {} pieces had been sent", report.message, attempted, pieces.size()),
+            fmt::format("{}; {} of {} pieces had been sent", report.message, advance.sent, pieces.size()),
             wayBack);
     }
 }

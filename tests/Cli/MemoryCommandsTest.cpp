@@ -240,6 +240,10 @@ TEST_P(MemoryCommandsTest, AFailedWriteTellsTheWayBack) {
         }
         ++failures;
         ASSERT_EQ(code, ExitCode::InputOutput) << tool.Err();
+        // A piece is its bytes and two terminators; it counts when all three were taken.
+        ASSERT_NE(tool.Err().find("; " + std::to_string(piece / 3) + " of 13 pieces had been sent"),
+                  std::string::npos)
+            << piece << ": " << tool.Err();
         std::string said = tool.Err();
         std::erase(said, '"');  // names with backslashes are quoted
         ASSERT_NE(said.find("ostra eeprom restore " + backup + " --device sim"), std::string::npos) << said;
