@@ -39,13 +39,7 @@ void Put(Session& session, const PutOptions& options) {
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     const MemoryTarget::Outcome outcome =
         target.Change(WithBinaryBlock(target.Image(), block), options.change, Granularity::Elements);
-    if (options.memory.json) {
-        Json result = target.JsonOf(outcome);
-        result["file"] = options.file;
-        session.Print(result);
-    } else {
-        session.Out() << MemoryTarget::TextOf(outcome, target.Name()) << '\n';
-    }
+    target.Report(outcome, options.memory.json, {{"file", options.file}});
 }
 
 }  // namespace

@@ -38,23 +38,17 @@ void Set(Session& session, const SetOptions& options) {
     const EditedImage edited = target.Interpret(
         [&assignments](const EepromImage& image) { return WithCalibration(image, assignments); });
     const MemoryTarget::Outcome outcome = target.Change(edited.image, options.change, Granularity::Elements);
-    if (options.memory.json) {
-        Json changes = Json::array();
-        for (const ValueChange& change : edited.changes) {
-            changes.push_back(
-                {{"id", change.id}, {"before", JsonOf(change.before)}, {"after", JsonOf(change.after)}});
-        }
-        Json result = target.JsonOf(outcome);
-        result["changes"] = changes;
-        session.Print(result);
-        return;
-    }
+    Json changes = Json::array();
     Table table({{"ID", Table::Align::Right}, {"BEFORE"}, {}, {"AFTER"}});
     for (const ValueChange& change : edited.changes) {
+        changes.push_back(
+            {{"id", change.id}, {"before", JsonOf(change.before)}, {"after", JsonOf(change.after)}});
         table.AddRow({std::to_string(change.id), TextOf(change.before), "->", TextOf(change.after)});
     }
-    table.Print(session.Out());
-    session.Out() << MemoryTarget::TextOf(outcome, target.Name()) << '\n';
+    if (!options.memory.json) {
+        table.Print(session.Out());
+    }
+    target.Report(outcome, options.memory.json, {{"changes", changes}});
 }
 
 }  // namespace

@@ -68,13 +68,7 @@ void WriteOrRestore(Session& session, const WriteOptions& options, const ChangeO
     CheckBeforeWriting(session, options, image);
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     const MemoryTarget::Outcome outcome = target.Change(image, change, Granularity::Pieces);
-    if (options.memory.json) {
-        Json result = target.JsonOf(outcome);
-        result["file"] = options.file;
-        session.Print(result);
-    } else {
-        session.Out() << MemoryTarget::TextOf(outcome, target.Name()) << '\n';
-    }
+    target.Report(outcome, options.memory.json, {{"file", options.file}});
 }
 
 void Write(Session& session, const WriteOptions& options) {

@@ -45,11 +45,10 @@ void Reset(Session& session, const ResetOptions& options) {
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     const EepromImage empty = target.Interpret(WithEmptyLog);
     const MemoryTarget::Outcome outcome = target.Change(empty, options.change, Granularity::Elements);
-    if (options.memory.json) {
-        session.Print(target.JsonOf(outcome));
-    } else {
-        session.Out() << "empty log: " << MemoryTarget::TextOf(outcome, target.Name()) << '\n';
+    if (!options.memory.json) {
+        session.Out() << "empty log: ";
     }
+    target.Report(outcome, options.memory.json, Json::object());
 }
 
 }  // namespace

@@ -72,14 +72,10 @@ void Put(Session& session, const PutOptions& options) {
                       fmt::format("0x{:08X}", word.value)});
     }
     const MemoryTarget::Outcome outcome = target.Change(edited, options.change, Granularity::Elements);
-    if (options.memory.json) {
-        Json result = target.JsonOf(outcome);
-        result["changes"] = changes;
-        session.Print(result);
-    } else {
+    if (!options.memory.json) {
         table.Print(session.Out());
-        session.Out() << MemoryTarget::TextOf(outcome, target.Name()) << '\n';
     }
+    target.Report(outcome, options.memory.json, {{"changes", changes}});
 }
 
 }  // namespace

@@ -3,6 +3,7 @@
 #include <fmt/format.h>
 
 #include <filesystem>
+#include <ostream>
 
 #include "Commands/CommonOptions.h"
 #include "Memory/ImageCheck.h"
@@ -128,23 +129,26 @@ MemoryTarget::Outcome MemoryTarget::Change(const EepromImage& wanted, const Chan
     return outcome;
 }
 
-std::string MemoryTarget::TextOf(const Outcome& outcome, const std::string& name) {
-    if (outcome.bytes == 0) {
-        return name + " holds this already; nothing to write";
+void MemoryTarget::Report(const Outcome& outcome, bool asJson, const Json& details) const {
+    if (asJson) {
+        Json result = {{"target", name},
+                       {"dryRun", outcome.dryRun},
+                       {"changedBytes", outcome.bytes},
+                       {"pieces", outcome.pieces},
+                       {"backup", outcome.backup.empty() ? Json(nullptr) : Json(outcome.backup)}};
+        result.update(details);
+        session.Print(result);
+        return;
     }
-    const std::string bytes = CountOf(outcome.bytes, "byte");
-    const std::string pieces = outcome.pieces > 0 ? " in " + CountOf(outcome.pieces, "piece") : "";
-    return outcome.dryRun ? fmt::format("{} of {} would be changed{}", bytes, name, pieces)
-                          : fmt::format("{} of {} changed{}{}", bytes, name, pieces,
-                                        outcome.pieces > 0 ? ", read back and compared" : "");
-}
-
-Json MemoryTarget::JsonOf(const Outcome& outcome) const {
-    return {{"target", name},
-            {"dryRun", outcome.dryRun},
-            {"changedBytes", outcome.bytes},
-            {"pieces", outcome.pieces},
-            {"backup", outcome.backup.empty() ? Json(nullptr) : Json(outcome.backup)}};
+    if (outcome.bytes == 0) {
+        session.Out() << name << " holds this already; nothing to write\n";
+        return;
+    }
+    const bool isInstrument = outcome.pieces > 0;
+    session.Out() << CountOf(outcome.bytes, "byte") << " of " << name
+                  << (outcome.dryRun ? " would be changed" : " changed")
+                  << (isInstrument ? " in " + CountOf(outcome.pieces, "piece") : "")
+                  << (isInstrument && !outcome.dryRun ? ", read back and compared" : "") << '\n';
 }
 
 }  // namespace Varnholt::Cli

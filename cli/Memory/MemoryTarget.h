@@ -63,9 +63,8 @@ class MemoryTarget final {
     /// what differs is written, and all is read back.
     Outcome Change(const EepromImage& wanted, const ChangeOptions& options, Granularity granularity);
 
-    /// As the user reads it.
-    static std::string TextOf(const Outcome& outcome, const std::string& name);
-    nlohmann::ordered_json JsonOf(const Outcome& outcome) const;
+    /// Tells the user of a change; as JSON if it is wanted, then with the members of `details` as well.
+    void Report(const Outcome& outcome, bool asJson, const nlohmann::ordered_json& details) const;
 
   private:
     ToolFailure Unusable(const std::string& reason) const;
