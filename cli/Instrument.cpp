@@ -99,6 +99,7 @@ Instrument::Instrument(Session& usedSession, const InstrumentOptions& options, C
         session.Note("taking " + identifier + ", the first of " + std::to_string(connected.size()) +
                      " (--device names another)");
     }
+    session.BeginRecording();
     std::string opened;
     try {
         transport = Transport::Instance(listener, static_cast<std::uint32_t>(index));

@@ -6,6 +6,7 @@
 #include "Instrument.h"
 #include "Output/Json.h"
 #include "Platform/HostQueries.h"
+#include "SystemCommands.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -19,17 +20,35 @@ constexpr int WidestPlot = 120;
 }  // namespace
 
 Session::Session(Surroundings& surroundings, Interruption& userInterruption)
-    : where(surroundings),
-      interruption(userInterruption),
-      files(Platform::DeviceFiles()),
-      filesInForce(files),
-      transportBefore(Platform::Overridden64BitHost()) {
-    interruption.SetAction([this] { files.Interrupt(); });
-}
+    : where(surroundings), interruption(userInterruption), transportBefore(Platform::Overridden64BitHost()) {}
 
 Session::~Session() {
     interruption.SetAction({});
     Platform::Override64BitHost(transportBefore);
+}
+
+void Session::CarryOut() {
+    if (!captureFile.empty()) {
+        recording = RecordTraffic(captureFile);
+    }
+    files.emplace(Platform::DeviceFiles());
+    filesInForce.emplace(*files);
+    interruption.SetAction([this] { files->Interrupt(); });
+    interruption.ThrowIfRequested();  // one that came before
+    action();
+    where.out.flush();
+    if (!where.out) {
+        throw ToolFailure(ExitCode::File, "the output cannot be written");
+    }
+    if (recording) {
+        recording->Check();
+    }
+}
+
+void Session::BeginRecording() {
+    if (recording) {
+        recording->Begin();
+    }
 }
 
 std::string Session::Paint(const char* color, const std::string& text) const {

@@ -2,6 +2,7 @@
 
 #include <functional>
 #include <iosfwd>
+#include <memory>
 #include <nlohmann/json_fwd.hpp>
 #include <optional>
 #include <string>
@@ -23,7 +24,9 @@ struct Surroundings {
     StreamFacts errFacts;
 };
 
-/// One run of the tool, as its commands see it. Its device files are in force for its life.
+class TrafficRecording;
+
+/// One run of the tool, as its commands see it. Its device files are in force once its action is carried out.
 class Session final {
   public:
     /// References must outlive the session.
@@ -45,7 +48,11 @@ class Session final {
     PlotStyle StyleOfPlots() const;
 
     Interruption& UserInterruption() { return interruption; }
-    Platform::InterruptibleDeviceFiles& Files() { return files; }
+    /// For the action.
+    Platform::InterruptibleDeviceFiles& Files() { return *files; }
+    /// The recording that is asked for begins: everything is known to be right, and an instrument about to be
+    /// opened.
+    void BeginRecording();
 
     /// "native", "usbio", or empty: what the platform prefers.
     void UseTransport(const std::string& transport);
@@ -54,16 +61,20 @@ class Session final {
     FailureReport Explain(const std::exception_ptr& failure) const;
     void SetInstrumentInUse(const std::string& identifier) { instrumentInUse = identifier; }
 
-    /// What the command line asks for; carried out when it has been understood as a whole.
+    /// What the command line asks for.
     std::function<void()> action;
+    std::string captureFile;  ///< for the USB traffic; empty: it is not recorded
+    /// Does it, when the command line has been understood as a whole.
+    void CarryOut();
 
   private:
     std::string Paint(const char* color, const std::string& text) const;
 
     Surroundings& where;
     Interruption& interruption;
-    Platform::InterruptibleDeviceFiles files;
-    const Platform::ScopedDeviceFiles filesInForce;
+    std::unique_ptr<TrafficRecording> recording;
+    std::optional<Platform::InterruptibleDeviceFiles> files;  // stand on those of the recording
+    std::optional<Platform::ScopedDeviceFiles> filesInForce;
     const std::optional<bool> transportBefore;
     std::string instrumentInUse;
 };

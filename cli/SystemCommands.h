@@ -22,10 +22,14 @@ extern const char* const TransferFailed;
 /// Prints the devices that could be instruments, as a table or JSON (--candidates of the list command).
 void PrintCandidates(Session& session, bool json);
 
-/// Records the USB traffic of the instruments in a pcapng file, for the object's life.
+/// Records the USB traffic of the instruments in a pcapng file. The object's device files are in force for
+/// its life.
 class TrafficRecording {
   public:
     virtual ~TrafficRecording() = default;
+    /// Makes the file, or empties the one that is there. Before that nothing is recorded. Throws
+    /// `ToolFailure`.
+    virtual void Begin() = 0;
     /// Throws `ToolFailure` when something could not be written.
     virtual void Check() const = 0;
 };

@@ -1,3 +1,5 @@
+#include <optional>
+
 #include "Commands/Commands.h"
 #include "Failure.h"
 #include "Output/Json.h"
@@ -14,23 +16,34 @@
 namespace Varnholt::Cli {
 namespace {
 
-class BusRecording final : public TrafficRecording {
+/// The system's bus, whose devices are recorded once the recording has begun.
+class BusRecording final : public TrafficRecording, private Platform::Usb::UsbBus {
   public:
-    explicit BusRecording(const std::string& file) : name(file), writer(file, "ostra " OSTRA_VERSION) {
-        Check();
-    }
+    explicit BusRecording(const std::string& file) : name(file) {}
 
+    void Begin() override {
+        writer.emplace(name, "ostra " OSTRA_VERSION);
+        Check();
+        recorded.emplace(bus, *writer);
+    }
     void Check() const override {
-        if (writer.Failed()) {
+        if (writer && writer->Failed()) {
             throw ToolFailure(ExitCode::File, name + " cannot be written");
         }
     }
 
   private:
+    std::vector<std::string> List() override { return bus.List(); }
+    std::shared_ptr<Platform::Usb::UsbDevice> Open(const std::string& device,
+                                                   Platform::ErrorCode& error) override {
+        return recorded ? recorded->Open(device, error) : bus.Open(device, error);
+    }
+
     const std::string name;
-    Platform::Usb::PcapngWriter writer;
-    Platform::Usb::CapturingBus bus{Platform::Usb::SystemUsbBus(), writer};
-    const std::unique_ptr<Platform::DeviceFileSystem> files = Platform::Drivers::MakeDriverFileSystem(bus);
+    Platform::Usb::UsbBus& bus = Platform::Usb::SystemUsbBus();
+    std::optional<Platform::Usb::PcapngWriter> writer;
+    std::optional<Platform::Usb::CapturingBus> recorded;
+    const std::unique_ptr<Platform::DeviceFileSystem> files = Platform::Drivers::MakeDriverFileSystem(*this);
     const Platform::ScopedDeviceFiles filesInForce{*files};
 };
 

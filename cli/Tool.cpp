@@ -34,19 +34,15 @@ void BuildCommandLine(CLI::App& app, Session& session) {
     app.fallthrough();  // what stands before the command may stand behind it as well
     app.set_version_flag("--version", "ostra " OSTRA_VERSION, "print the version");
     app.set_help_flag("-h,--help", "print this help");
-    static std::string captureFile;  // read by `CaptureFileIn`; here for the help
-    app.add_option("--capture", captureFile, "record the USB traffic in a pcapng file")->type_name("FILE");
+    CommandSpec tool(&app);
+    tool.Add("--capture", session.captureFile,
+             "record the USB traffic in a pcapng file, made when an instrument is opened")
+        .Type("FILE");
     for (const AddCommand add : Commands) {
-        add(CommandSpec(&app), session);
+        add(tool, session);
     }
-    AddSystemCommands(CommandSpec(&app), session);
+    AddSystemCommands(tool, session);
     app.footer(Footer);  // after the commands, which would inherit it
-}
-
-/// The command line as CLI11 wants it: the last argument first.
-std::vector<std::string> Reversed(std::vector<std::string> arguments) {
-    std::reverse(arguments.begin(), arguments.end());
-    return arguments;
 }
 
 /// What is wrong with a command line, and whose help tells more.
@@ -73,22 +69,7 @@ FailureReport ReportOf(const CLI::App& app, const CLI::ParseError& error) {
     return {ExitCode::Usage, message, "`" + name + " --help` tells more"};
 }
 
-/// What --capture names. Looked for before anything else, because everything else stands on the recorded
-/// files.
-std::string CaptureFileIn(const std::vector<std::string>& arguments) {
-    std::string file;
-    CLI::App early;
-    early.set_help_flag();
-    early.allow_extras();
-    early.add_option("--capture", file);
-    try {
-        early.parse(Reversed(arguments));
-    } catch (const CLI::ParseError&) {  // the whole command line is understood later, with a better message
-    }
-    return file;
-}
-
-ExitCode Run(const std::vector<std::string>& arguments, Surroundings& surroundings, Session& session) {
+ExitCode Run(std::vector<std::string> arguments, Surroundings& surroundings, Session& session) {
     CLI::App app(Description, "ostra");
     BuildCommandLine(app, session);
     if (arguments.empty()) {
@@ -96,7 +77,8 @@ ExitCode Run(const std::vector<std::string>& arguments, Surroundings& surroundin
         return ExitCode::Usage;
     }
     try {
-        app.parse(Reversed(arguments));
+        std::reverse(arguments.begin(), arguments.end());  // the parser wants the last one first
+        app.parse(arguments);
     } catch (const CLI::ParseError& error) {
         const bool isHelp = error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success);
         if (isHelp) {
@@ -106,11 +88,7 @@ ExitCode Run(const std::vector<std::string>& arguments, Surroundings& surroundin
         session.Report(ReportOf(app, error));
         return ExitCode::Usage;
     }
-    session.action();
-    surroundings.out.flush();
-    if (!surroundings.out) {
-        throw ToolFailure(ExitCode::File, "the output cannot be written");
-    }
+    session.CarryOut();
     return ExitCode::Success;
 }
 
@@ -118,27 +96,9 @@ ExitCode Run(const std::vector<std::string>& arguments, Surroundings& surroundin
 
 ExitCode RunTool(const std::vector<std::string>& arguments, Surroundings& surroundings,
                  Interruption& interruption) {
-    // The session's files stand on the recorded ones, so the recording is there before the session and
-    // outlives it.
-    std::unique_ptr<TrafficRecording> recording;
-    std::exception_ptr notRecorded;
-    try {
-        if (const std::string file = CaptureFileIn(arguments); !file.empty()) {
-            recording = RecordTraffic(file);
-        }
-    } catch (...) {
-        notRecorded = std::current_exception();
-    }
     Session session(surroundings, interruption);
     try {
-        if (notRecorded) {
-            std::rethrow_exception(notRecorded);
-        }
-        const ExitCode code = Run(arguments, surroundings, session);
-        if (recording) {
-            recording->Check();
-        }
-        return code;
+        return Run(arguments, surroundings, session);
     } catch (...) {
         const FailureReport report = session.Explain(std::current_exception());
         session.Report(report);

@@ -8,6 +8,7 @@
 #include <exception>
 #include <iostream>
 #include <memory>
+#include <optional>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -85,14 +86,7 @@ void Run(const ProgramOptions& options) {
         throw std::runtime_error("more --eeprom files than instruments");
     }
     const FaultPlan faults = FaultPlan::Parse(options.faults);
-    std::unique_ptr<Usb::PcapngWriter> capture;
-    if (!options.captureFile.empty()) {
-        capture = std::make_unique<Usb::PcapngWriter>(options.captureFile, "ostra-simulator");
-        if (capture->Failed()) {
-            throw std::runtime_error("cannot write " + options.captureFile);
-        }
-    }
-
+    std::optional<Usb::PcapngWriter> capture;  // made last: nothing is emptied for options that are wrong
     std::vector<std::unique_ptr<EepromFile>> files;
     UsbIpServer server(loop, log);
     for (std::size_t i = 0; i < names.size(); ++i) {
@@ -108,7 +102,7 @@ void Run(const ProgramOptions& options) {
         }
         const auto instrument = std::make_shared<SimulatedInstrument>(loop, std::move(settings));
         UsbIpServer::Export exported{names[i], instrument, faults, {}};
-        if (capture) {
+        if (!options.captureFile.empty()) {
             const auto number = static_cast<std::uint8_t>(i + 1);
             exported.wrap = [&capture, number](std::shared_ptr<Usb::UsbDevice> device) {
                 return Usb::CaptureDevice(std::move(device), *capture, number);
@@ -117,6 +111,12 @@ void Run(const ProgramOptions& options) {
         server.Add(std::move(exported));
         if (file) {
             file->Keep(instrument);
+        }
+    }
+    if (!options.captureFile.empty()) {
+        capture.emplace(options.captureFile, "ostra-simulator");
+        if (capture->Failed()) {
+            throw std::runtime_error("cannot write " + options.captureFile);
         }
     }
     if (options.attach) {

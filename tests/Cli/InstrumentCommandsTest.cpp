@@ -303,5 +303,27 @@ TEST(CommandLineTest, UsageErrorsGoToStandardError) {
     EXPECT_EQ(tool.Out(), "ostra 1.0.3\n");
 }
 
+#if !defined(_WIN32)
+TEST(CommandLineTest, AWrongOneLeavesTheCaptureFileThatIsThere) {
+    const TestFolder folder;
+    const std::string file = folder.Path("capture");
+    WriteFile(file, {1});
+    ToolRunner tool;
+    for (const std::vector<std::string>& arguments : std::vector<std::vector<std::string>>{
+             {"readout", "--no-such-option"},
+             {"write-image"},
+             {"scan", "--record-size", "7"},
+             {"calibration", "set", "1211"},
+             {"readout", "--device", "nobody"},
+         }) {
+        std::vector<std::string> withCapture{"--capture", file};
+        withCapture.insert(withCapture.end(), arguments.begin(), arguments.end());
+        EXPECT_NE(tool.Run(withCapture), ExitCode::Success) << testing::PrintToString(arguments);
+        EXPECT_EQ(ReadFile(file), std::vector<std::uint8_t>{1}) << testing::PrintToString(arguments);
+    }
+    EXPECT_EQ(tool.Run({"list", "--capture", ""}), ExitCode::Usage);
+}
+#endif
+
 }  // namespace
 }  // namespace Varnholt::Tests
