@@ -8,6 +8,7 @@ namespace {
 using Cli::ExitCode;
 using Cli::Finding;
 using Level = Cli::Finding::Level;
+using testing::HasSubstr;
 
 Cli::DeviceFacts Plugged(const char* kernelDriver = "", bool isRegistered = true) {
     Cli::DeviceFacts facts;
@@ -24,20 +25,26 @@ Cli::DeviceFacts Plugged(const char* kernelDriver = "", bool isRegistered = true
     return facts;
 }
 
-/// What is seen, what opening it gives, and the finding that tells it.
+const Cli::Answer Answers{301, std::nullopt};
+const Cli::Answer Silence{0, Cli::FailureReport{ExitCode::Timeout, "no answer in time", ""}};
+
+/// What is seen, what opening it gives, and the findings that tell it.
 struct Diagnosis {
     const char* name;
     Cli::MachineFacts facts;
-    Cli::Answer answer;
     std::vector<Level> levels;
     const char* text;  ///< is in the last finding
     const char* fix;   ///< is in its fix; empty: there is none
     ExitCode code;
-    int opened;  ///< instruments that are tried
+    int opened = 0;  ///< instruments that are tried
+    Cli::Answer answer = Answers;
 };
 
+Diagnosis Usable(const char* name, const Cli::MachineFacts& facts, const std::vector<Level>& levels) {
+    return {name, facts, levels, "answers (firmware 301)", "", ExitCode::Success, 1};
+}
+
 std::vector<Diagnosis> Diagnoses() {
-    const Cli::Answer fine{301, std::nullopt};
     auto locked = Plugged();
     locked.isAccessible = false;
     locked.holders = {{42, "python3"}};
@@ -45,98 +52,64 @@ std::vector<Diagnosis> Diagnoses() {
     held.holders = {{42, "python3"}};
     auto other = Plugged();
     other.hasEndpoints = false;
-    const auto problem = std::vector{Level::Problem};
+    const Platform::Usb::SimulatorInfo simulator{"simulated-1", 1000, 9, true, ""};
+    auto simulatorInUse = simulator;
+    simulatorInUse.usedBy = "ostra (process 8)";
+    auto simulatorOfAnother = simulator;
+    simulatorOfAnother.usable = false;
+    const std::vector problem{Level::Problem};
+    const std::vector good{Level::Good};
     return {
-        {"nothing", {}, fine, problem, "no USB device", "plug the instrument in", ExitCode::NoInstrument, 0},
-        {"good", {{Plugged()}, {}}, fine, {Level::Good}, "answers (firmware 301)", "", ExitCode::Success, 1},
+        {"nothing", {}, problem, "no USB device", "plug the instrument in", ExitCode::NoInstrument},
         {"not registered",
          {{Plugged("", false)}, {}},
-         fine,
          problem,
          "usb-1-2 (1209:0001, Meter)",
          "sudo ostra register 1209:0001",
-         ExitCode::NoInstrument,
-         0},
+         ExitCode::NoInstrument},
         {"registered by mistake",
          {{other}, {}},
-         fine,
          problem,
          "does not have the instrument's endpoints",
          "register --remove 1209:0001",
-         ExitCode::NoInstrument,
-         0},
+         ExitCode::NoInstrument},
         {"no permission",
          {{locked}, {}},
-         fine,
          problem,
          "no permission on /dev/bus/usb/001/007",
          "log in at this machine's own seat",
-         ExitCode::NotAvailable,
-         0},
+         ExitCode::NotAvailable},
         {"held",
          {{held}, {}},
-         fine,
          problem,
          "is in use by python3 (process 42)",
          "end that program",
-         ExitCode::NotAvailable,
-         0},
-        {"a kernel driver",
-         {{Plugged("cdc_acm")}, {}},
-         fine,
-         {Level::Note, Level::Good},
-         "answers",
-         "",
-         ExitCode::Success,
-         1},
-        {"a program drives it",
-         {{Plugged("usbfs")}, {}},
-         fine,
-         {Level::Good},
-         "answers",
-         "",
-         ExitCode::Success,
-         1},
+         ExitCode::NotAvailable},
         {"silent",
          {{Plugged()}, {}},
-         {0, Cli::FailureReport{ExitCode::Timeout, "no answer in time", ""}},
          problem,
          "does not answer: no answer in time",
          "its firmware does not run",
          ExitCode::Timeout,
-         1},
-        {"simulated",
-         {{}, {{"simulated-1", 1000, 9, true, ""}}},
-         fine,
-         {Level::Good},
-         "answers",
-         "",
-         ExitCode::Success,
-         1},
+         1,
+         Silence},
         {"simulated, in use",
-         {{}, {{"simulated-1", 1000, 9, true, "ostra (process 8)"}}},
-         fine,
+         {{}, {simulatorInUse}},
          problem,
          "is in use by ostra (process 8)",
          "end that program",
-         ExitCode::NotAvailable,
-         0},
+         ExitCode::NotAvailable},
         {"simulated, another user's",
-         {{}, {{"simulated-1", 1000, 9, false, ""}}},
-         fine,
+         {{}, {simulatorOfAnother}},
          {Level::Note, Level::Problem},
          "no USB device",
          "ostra-simulator",
-         ExitCode::NoInstrument,
-         0},
-        {"one held, one good",
-         {{held, Plugged()}, {}},
-         fine,
-         {Level::Problem, Level::Good},
-         "answers",
-         "",
-         ExitCode::Success,
-         1},
+         ExitCode::NoInstrument},
+        Usable("good", {{Plugged()}, {}}, good),
+        Usable("a kernel driver", {{Plugged("cdc_acm")}, {}}, {Level::Note, Level::Good}),
+        Usable("a program drives it", {{Plugged("usbfs")}, {}}, good),
+        Usable("simulated", {{}, {simulator}}, good),
+        Usable("one held, one good", {{held, Plugged()}, {}}, {Level::Problem, Level::Good}),
     };
 }
 
@@ -152,23 +125,22 @@ TEST(DoctorTest, NamesTheReasonAndTheFix) {
         for (const Finding& finding : findings) {
             levels.push_back(finding.level);
         }
-        EXPECT_EQ(levels, row.levels);
+        ASSERT_EQ(levels, row.levels);
         EXPECT_EQ(opened, row.opened) << "opening resets an instrument";
-        ASSERT_FALSE(findings.empty());
         const Finding& last = findings.back();
-        EXPECT_NE((last.subject + " " + last.text).find(row.text), std::string::npos) << last.text;
-        EXPECT_NE(last.fix.find(row.fix), std::string::npos) << last.fix;
+        EXPECT_THAT(last.subject + " " + last.text, HasSubstr(row.text));
+        EXPECT_THAT(last.fix, HasSubstr(row.fix));
         EXPECT_EQ(last.fix.empty(), *row.fix == '\0') << last.fix;
         EXPECT_EQ(last.code, row.code);
     }
 }
 
 TEST(DoctorTest, TellsOfWhatCannotBeUsed) {
-    const auto fine = [](const std::string&) { return Cli::Answer{301, std::nullopt}; };
-    const auto driver = Cli::Judge({{Plugged("cdc_acm")}, {}}, fine).front();
-    EXPECT_NE(driver.text.find("the kernel driver cdc_acm holds its interface"), std::string::npos);
-    const auto simulator = Cli::Judge({{}, {{"simulated-1", 1000, 9, false, ""}}}, fine).front();
-    EXPECT_NE(simulator.text.find("another user (user 1000, process 9)"), std::string::npos);
+    const auto answers = [](const std::string&) { return Answers; };
+    EXPECT_THAT(Cli::Judge({{Plugged("cdc_acm")}, {}}, answers).front().text,
+                HasSubstr("the kernel driver cdc_acm holds its interface"));
+    const auto simulator = Cli::Judge({{}, {{"simulated-1", 1000, 9, false, ""}}}, answers).front();
+    EXPECT_THAT(simulator.text, HasSubstr("another user (user 1000, process 9)"));
     EXPECT_EQ(simulator.code, ExitCode::Success) << "somebody else's simulator is no failure";
 }
 

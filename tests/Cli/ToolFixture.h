@@ -1,5 +1,6 @@
 #pragma once
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <filesystem>
@@ -60,10 +61,12 @@ inline void WriteFile(const std::string& path, const std::vector<std::uint8_t>& 
     file.write(reinterpret_cast<const char*>(content.data()), static_cast<std::streamsize>(content.size()));
 }
 
+using Arguments = std::vector<std::string>;
+
 /// Runs the tool in this process. The streams say that they are no terminals, unless a test says otherwise.
 class ToolRunner {
   public:
-    Cli::ExitCode Run(const std::vector<std::string>& arguments) {
+    Cli::ExitCode Run(const Arguments& arguments) {
         out.str({});
         err.str({});
         Cli::Surroundings surroundings{out, err, outFacts, errFacts};
@@ -93,8 +96,13 @@ class ToolRunner {
 class ToolTest : public testing::TestWithParam<Transport> {
   protected:
     /// Succeeds, or the test fails with what the tool said.
-    void Succeed(const std::vector<std::string>& arguments) {
+    void Succeed(const Arguments& arguments) {
         EXPECT_EQ(tool.Run(arguments), Cli::ExitCode::Success) << tool.Err();
+    }
+    /// Fails with this code, and tells the user of it with `text`.
+    void Fail(const Arguments& arguments, Cli::ExitCode code, const std::string& text = "") {
+        EXPECT_EQ(tool.Run(arguments), code) << testing::PrintToString(arguments) << ": " << tool.Err();
+        EXPECT_THAT(tool.Err(), testing::HasSubstr(text)) << testing::PrintToString(arguments);
     }
     std::string Identifier(const std::string& name = "sim") const { return host.Identifier(name); }
 
