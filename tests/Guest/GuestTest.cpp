@@ -13,6 +13,7 @@
 #include <cstdlib>
 #include <fstream>
 #include <functional>
+#include <iterator>
 #include <thread>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
@@ -234,6 +235,56 @@ TEST_P(OnKernel, BelongsToOneProcess) {
     kill(other, SIGKILL);
     waitpid(other, nullptr, 0);
     EXPECT_NO_THROW(PellandoFunctionality(nullptr, 0));
+}
+
+TEST_P(OnKernel, GoesOnAfterAStall) {
+    const PluggedInstrument plugged({"--faults", "bulk-in 0:stall"});
+    PellandoFunctionality instrument(nullptr, 0);
+    std::array<std::uint8_t, 256> buffer{};
+    instrument.SetMeasureParameters(294, 0, 1, 6);
+    try {
+        instrument.MeasureRequest(buffer.data(), 256, 1);
+        ADD_FAILURE() << "no failure";
+    } catch (const DeviceDriverException& exception) {
+        EXPECT_THAT(exception.what(), testing::HasSubstr(GetParam() ? "0xE0000030" : "(Win32 Error (31) : "));
+    }
+    EXPECT_NO_THROW(instrument.MeasureRequest(buffer.data(), 256, 1)) << "the halt is cleared";
+}
+
+/// A driver of the kernel that takes the interface of every instrument, for the object's life.
+class KernelDriver final {
+  public:
+    KernelDriver() {
+        EXPECT_EQ(std::system("insmod /lib/modules/usbtest.ko vendor=0x1209 product=0x0001"), 0);
+    }
+    ~KernelDriver() { EXPECT_EQ(std::system("rmmod usbtest"), 0); }
+    KernelDriver(const KernelDriver&) = delete;
+    KernelDriver& operator=(const KernelDriver&) = delete;
+};
+
+/// What drives the interface of the instrument, as the kernel names it.
+std::string InterfaceDriver() {
+    const auto devices = Platform::Usb::ListRegisteredDevices();
+    return devices.empty() ? "" : devices.front().kernelDriver;
+}
+
+TEST_P(OnKernel, TakesTheInterfaceFromAKernelDriverAndGivesItBack) {
+    const KernelDriver driver;
+    const PluggedInstrument plugged({});
+    ASSERT_TRUE(WaitFor([] { return InterfaceDriver() == "usbtest"; })) << InterfaceDriver();
+    // The simulator itself, which the kernel uses, is a finding of its own.
+    (void)!std::system("./ostra doctor > doctor.txt 2> /dev/null");
+    std::ifstream file("doctor.txt");
+    EXPECT_THAT(std::string(std::istreambuf_iterator<char>(file), {}),
+                testing::MatchesRegex("note: usb-.*kernel driver usbtest holds its interface; it gives way.*"
+                                      "good: usb-.*answers \\(firmware.*"));
+    EXPECT_EQ(InterfaceDriver(), "usbtest") << "the doctor has opened the instrument and closed it";
+    {
+        PellandoFunctionality instrument(nullptr, 0);
+        EXPECT_EQ(InterfaceDriver(), "usbfs");
+        EXPECT_NO_THROW(instrument.SetMeasureMode(1));
+    }
+    EXPECT_EQ(InterfaceDriver(), "usbtest");
 }
 
 /// Seconds that the bare libusb program takes; negative when it fails.
