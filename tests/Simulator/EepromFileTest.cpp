@@ -1,9 +1,6 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
-#include <unistd.h>
 
-#include <filesystem>
-#include <fstream>
 #include <memory>
 #include <stdexcept>
 #include <string>
@@ -13,7 +10,8 @@
 #include "FreshEeprom.h"
 #include "PollLoop.h"
 #include "Protocol/Instrument.h"
-#include "Simulator/TestTransfer.h"
+#include "Support/TestFolder.h"
+#include "Support/TestTransfer.h"
 
 namespace Varnholt::Simulator {
 namespace {
@@ -21,15 +19,10 @@ namespace {
 using Bytes = std::vector<std::uint8_t>;
 using Protocol::Request;
 using testing::HasSubstr;
+using Tests::TestTransfer;
 
 class EepromFileTest : public testing::Test {
   protected:
-    EepromFileTest() { std::filesystem::create_directory(folder); }
-    ~EepromFileTest() override { std::filesystem::remove_all(folder); }
-
-    static void WriteFile(const std::string& name, std::size_t size) {
-        std::ofstream(name, std::ios::binary) << std::string(size, 'x');
-    }
     std::shared_ptr<SimulatedInstrument> MakeInstrument(EepromFile& file) {
         InstrumentSettings settings;
         if (file.Exists()) {
@@ -41,7 +34,7 @@ class EepromFileTest : public testing::Test {
         return instrument;
     }
     static void WriteByte(SimulatedInstrument& instrument, std::uint8_t address, std::uint8_t value) {
-        TestTransfer request = TestTransfer::Vendor(Request::WriteEeprom, {0, 0, 0, address, 0, 1, 0, 0});
+        TestTransfer request = TestTransfer::Memory(Request::WriteEeprom, address, 1);
         TestTransfer data = TestTransfer::Out(Protocol::BulkOutEndpoint, {value});
         instrument.Submit(request);
         instrument.Submit(data);
@@ -52,9 +45,8 @@ class EepromFileTest : public testing::Test {
         loop.Run();
     }
 
-    const std::string folder =
-        std::filesystem::temp_directory_path() / ("ostra-eeprom-" + std::to_string(getpid()));
-    const std::string fileName = folder + "/eeprom.bin";
+    const Tests::TestFolder folder;
+    const std::string fileName = folder.Path("eeprom.bin");
     PollLoop loop;
     std::vector<std::string> complaints;
     const Log log = [this](const std::string& line) { complaints.push_back(line); };
@@ -78,7 +70,7 @@ TEST_F(EepromFileTest, MemoryIsThereAgainAfterARestart) {
     expected[8] = 43;
     expected[9] = 44;
     EXPECT_EQ(expected, instrument->Eeprom());
-    EXPECT_EQ(1, std::distance(std::filesystem::directory_iterator(folder), {})) << "nothing else is left";
+    EXPECT_EQ(1U, folder.Files().size()) << "nothing else is left";
     EXPECT_TRUE(complaints.empty());
 }
 
@@ -89,7 +81,7 @@ TEST_F(EepromFileTest, UnusableFilesAreExplained) {
     };
     for (const Case& test : {Case{0, "has 0 bytes, but an EEPROM has 8192"}, Case{8191, "has 8191 bytes"},
                              Case{8193, "remove this one to begin with a fresh EEPROM"}}) {
-        WriteFile(fileName, test.size);
+        Tests::WriteFile(fileName, Bytes(test.size));
         try {
             ReadEepromFile(fileName);
             ADD_FAILURE() << test.size;
@@ -97,12 +89,12 @@ TEST_F(EepromFileTest, UnusableFilesAreExplained) {
             EXPECT_THAT(error.what(), HasSubstr(test.explanation));
         }
     }
-    EXPECT_THROW(ReadEepromFile(folder + "/none"), std::runtime_error);
-    EXPECT_THROW(ReadEepromFile(folder), std::runtime_error);
+    EXPECT_THROW(ReadEepromFile(folder.Path("none")), std::runtime_error);
+    EXPECT_THROW(ReadEepromFile(folder.Path("")), std::runtime_error);
 }
 
 TEST_F(EepromFileTest, FailureToWriteIsToldAndKeepsTheOldFile) {
-    EepromFile file(loop, folder + "/missing/eeprom.bin", log);
+    EepromFile file(loop, folder.Path("missing/eeprom.bin"), log);
     const auto instrument = std::make_shared<SimulatedInstrument>(loop);
     file.Keep(instrument);
     ASSERT_EQ(1U, complaints.size());

@@ -1,6 +1,5 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
-#include <unistd.h>
 
 #include <filesystem>
 #include <fstream>
@@ -10,6 +9,7 @@
 #include <vector>
 
 #include "KernelPort.h"
+#include "Support/TestFolder.h"
 
 namespace Varnholt::Simulator {
 namespace {
@@ -20,14 +20,10 @@ constexpr const char* Free = " 004 000 00000000 000000 0-0\n";
 
 class KernelPortTest : public testing::Test {
   protected:
-    KernelPortTest() { std::filesystem::create_directory(folder); }
-    ~KernelPortTest() override { std::filesystem::remove_all(folder); }
-    void Write(const std::string& name, const std::string& text) {
-        std::ofstream(folder + "/" + name) << text;
-    }
+    void Write(const std::string& name, const std::string& text) { std::ofstream(files.Path(name)) << text; }
 
-    const std::string folder =
-        std::filesystem::temp_directory_path() / ("ostra-vhci-" + std::to_string(getpid()));
+    const Tests::TestFolder files;
+    const std::string folder = files.Path("");
 };
 
 TEST_F(KernelPortTest, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
@@ -60,14 +56,14 @@ TEST_F(KernelPortTest, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
             continue;
         }
         EXPECT_EQ(std::stoul(test.order), PlugIntoKernel(7, 0x10002, folder)) << test.name;
-        std::ifstream written(folder + "/attach");
+        std::ifstream written(files.Path("attach"));
         EXPECT_EQ(test.order, std::string(std::istreambuf_iterator<char>(written), {})) << test.name;
     }
 }
 
 TEST_F(KernelPortTest, SaysWhatToDoWhereThereIsNoSuchHost) {
     try {
-        PlugIntoKernel(7, 0x10002, folder + "/missing");
+        PlugIntoKernel(7, 0x10002, files.Path("missing"));
         ADD_FAILURE();
     } catch (const std::runtime_error& error) {
         EXPECT_THAT(error.what(), testing::HasSubstr("modprobe vhci-hcd"));

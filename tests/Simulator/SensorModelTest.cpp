@@ -79,9 +79,5 @@ TEST(SensorModelTest, NoiseIsSeededAndAveragesOut) {
     EXPECT_LT(spread(256), 3);
 }
 
-TEST(SensorModelTest, RecordNumberStandsInTheLastBytes) {
-    EXPECT_EQ(0x0203, Readings(SensorModel(1, 1.0, 1.0), {20000}, 0, 0x10203)[127]);
-}
-
 }  // namespace
 }  // namespace Varnholt::Simulator

@@ -19,9 +19,9 @@
 #include "Platform/Usb/SimulatorBus.h"
 #include "Platform/Usb/SystemUsbBus.h"
 #include "Platform/Usb/UsbIpDevice.h"
-#include "Platform/Usb/WaitedTransfer.h"
 #include "Protocol/ByteOrder.h"
 #include "Simulator/ServerThread.h"
+#include "Support/TestTransfer.h"
 #include "UsbIpServer.h"
 
 namespace Varnholt::Simulator {
@@ -33,23 +33,16 @@ using Platform::Usb::SimulatorBus;
 using Platform::Usb::SimulatorInfo;
 using Platform::Usb::TransferStatus;
 using Platform::Usb::UsbDevice;
-using Platform::Usb::WaitedTransfer;
 using Protocol::BulkInEndpoint;
 using Protocol::BulkOutEndpoint;
 using Protocol::InterruptInEndpoint;
 using Protocol::Request;
+using Tests::TestTransfer;
 namespace Errors = Platform::Errors;
 namespace UsbIp = Platform::Usb::UsbIp;
 
-Bytes AddressAndLength(std::uint32_t address, std::uint16_t length) {
-    Bytes bytes(8);
-    Protocol::StoreBig32(&bytes[0], address);
-    Protocol::StoreBig16(&bytes[4], length);
-    return bytes;
-}
-
 /// Does a transfer and answers the bytes that came.
-Bytes Do(UsbDevice& device, WaitedTransfer&& transfer) {
+Bytes Do(UsbDevice& device, TestTransfer&& transfer) {
     EXPECT_EQ(Errors::Success, device.Submit(transfer));
     EXPECT_TRUE(transfer.Wait());
     EXPECT_EQ(TransferStatus::Completed, transfer.status);
@@ -111,7 +104,7 @@ TEST_F(UsbIpServerTest, InstrumentsAreListedByNameForAsLongAsTheyAreThere) {
     }
 }
 
-TEST_F(UsbIpServerTest, ReadoutAndMemoryTravelBothWays) {
+TEST_F(UsbIpServerTest, MemoryTravelsBothWays) {
     const auto instrument = server.Add(name);
     const auto device = Open(name);
     const auto endpoints = device->Endpoints();
@@ -119,21 +112,12 @@ TEST_F(UsbIpServerTest, ReadoutAndMemoryTravelBothWays) {
     EXPECT_EQ(BulkOutEndpoint, endpoints[0].address);
     EXPECT_FALSE(instrument->Claimed()) << "the question for the endpoints has ended its claim";
     ASSERT_EQ(Errors::Success, device->Claim());
-
-    Do(*device, WaitedTransfer(Request::SetMeasureParameters, {0x01, 0x26, 0, 0, 0, 1, 6, 0}));
-    Do(*device, WaitedTransfer(Request::Measure, {}));
-    const Bytes readout = Do(*device, WaitedTransfer(BulkInEndpoint, WaitedTransfer::Room(256)));
-    server.Do([&] {
-        EXPECT_EQ(instrument->WithCommands([](Commands& state) { return state.Answers().Expected(0, 256); }),
-                  readout);
-    });
-
-    Do(*device, WaitedTransfer(Request::WriteEeprom, AddressAndLength(300, 3)));
-    Do(*device, WaitedTransfer(BulkOutEndpoint, {1, 2, 3}));
-    Do(*device, WaitedTransfer(BulkOutEndpoint, {0}));
-    Do(*device, WaitedTransfer(BulkOutEndpoint, {0}));
-    Do(*device, WaitedTransfer(Request::ReadEeprom, AddressAndLength(299, 5)));
-    const Bytes memory = Do(*device, WaitedTransfer(BulkInEndpoint, WaitedTransfer::Room(5)));
+    Do(*device, TestTransfer::Memory(Request::WriteEeprom, 300, 3));
+    Do(*device, TestTransfer::Out(BulkOutEndpoint, {1, 2, 3}));
+    Do(*device, TestTransfer::Out(BulkOutEndpoint, {0}));
+    Do(*device, TestTransfer::Out(BulkOutEndpoint, {0}));
+    Do(*device, TestTransfer::Memory(Request::ReadEeprom, 299, 5));
+    const Bytes memory = Do(*device, TestTransfer::In(BulkInEndpoint, 5));
     EXPECT_EQ((Bytes{1, 2, 3}), Bytes(memory.begin() + 1, memory.begin() + 4));
 }
 
@@ -144,12 +128,12 @@ TEST_F(UsbIpServerTest, ScanWithTwoTransfersInFlightIsComplete) {
     settings.scanBytes = total;
     const auto instrument = server.Add(name, settings);
     const auto device = OpenAndClaim(name);
-    Do(*device, WaitedTransfer(Request::Measure, {}));
+    Do(*device, TestTransfer::Vendor(Request::Measure, {}));
     Bytes all;
-    auto current = std::make_unique<WaitedTransfer>(BulkInEndpoint, WaitedTransfer::Room(piece));
+    auto current = std::unique_ptr<TestTransfer>(new TestTransfer(TestTransfer::In(BulkInEndpoint, piece)));
     device->Submit(*current);
     for (;;) {
-        auto next = std::make_unique<WaitedTransfer>(BulkInEndpoint, WaitedTransfer::Room(piece));
+        auto next = std::unique_ptr<TestTransfer>(new TestTransfer(TestTransfer::In(BulkInEndpoint, piece)));
         device->Submit(*next);
         ASSERT_TRUE(current->Wait());
         const Bytes data = current->Data();
@@ -169,22 +153,6 @@ TEST_F(UsbIpServerTest, ScanWithTwoTransfersInFlightIsComplete) {
     });
 }
 
-TEST_F(UsbIpServerTest, PendingTransfersAreCancelledAndButtonsReported) {
-    const auto instrument = server.Add(name);
-    const auto device = OpenAndClaim(name);
-    WaitedTransfer bulk(BulkInEndpoint, WaitedTransfer::Room(64));
-    WaitedTransfer interrupt(InterruptInEndpoint, WaitedTransfer::Room(8));
-    device->Submit(bulk);
-    device->Submit(interrupt);
-    device->Cancel(bulk);
-    ASSERT_TRUE(bulk.Wait());
-    EXPECT_EQ(TransferStatus::Cancelled, bulk.status);
-    EXPECT_EQ(0, interrupt.Completions());
-    server.Do([&] { instrument->PressButton(); });
-    ASSERT_TRUE(interrupt.Wait());
-    EXPECT_EQ(1U, interrupt.actualLength);
-}
-
 TEST_F(UsbIpServerTest, OneProgramAtATime) {
     const auto instrument = server.Add(name);
     const auto first = OpenAndClaim(name);
@@ -198,48 +166,29 @@ TEST_F(UsbIpServerTest, OneProgramAtATime) {
     EXPECT_EQ("", Describe(name).usedBy);
 }
 
-TEST_F(UsbIpServerTest, UnpluggedInstrumentIsGoneUntilItIsBack) {
-    const auto instrument = server.Add(name);
-    const auto device = OpenAndClaim(name);
-    WaitedTransfer bulk(BulkInEndpoint, WaitedTransfer::Room(64));
-    WaitedTransfer interrupt(InterruptInEndpoint, WaitedTransfer::Room(1));
-    device->Submit(bulk);
-    device->Submit(interrupt);
-    Do(*device, WaitedTransfer(Request::Reset, {31}));  // so that both have arrived
-    server.Do([&] { instrument->Unplug(); });
-    ASSERT_TRUE(bulk.Wait());
-    ASSERT_TRUE(interrupt.Wait());
-    EXPECT_EQ(TransferStatus::DeviceGone, bulk.status);
-    EXPECT_EQ(TransferStatus::DeviceGone, interrupt.status);
-    EXPECT_EQ(Errors::DeviceNotConnected, Open(name)->Claim());
-    server.Do([&] { instrument->PlugIn(); });
-    EXPECT_EQ(Errors::DeviceNotConnected, device->Claim()) << "this one was unplugged";
-    EXPECT_EQ(Errors::Success, Open(name)->Claim());
-}
-
 TEST_F(UsbIpServerTest, FaultsCrossTheConnection) {
     server.Add(name, {}, "bulk-in 0:stall; bulk-in 2:late-cancel; control 3:gone-before");
     for (int round = 0; round < 2; ++round) {
         const auto device = OpenAndClaim(name);
-        WaitedTransfer stalled(BulkInEndpoint, WaitedTransfer::Room(64));
+        TestTransfer stalled = TestTransfer::In(BulkInEndpoint, 64);
         device->Submit(stalled);
         ASSERT_TRUE(stalled.Wait());
         EXPECT_EQ(TransferStatus::Stalled, stalled.status);
         ASSERT_EQ(Errors::Success, device->ClearHalt(BulkInEndpoint));
 
-        Do(*device, WaitedTransfer(Request::ReadEeprom, AddressAndLength(4096, 64)));
-        EXPECT_EQ(0x01, Do(*device, WaitedTransfer(BulkInEndpoint, WaitedTransfer::Room(2)))[1]);
-        WaitedTransfer late(BulkInEndpoint, WaitedTransfer::Room(64));
+        Do(*device, TestTransfer::Memory(Request::ReadEeprom, 4096, 64));
+        EXPECT_EQ(0x01, Do(*device, TestTransfer::In(BulkInEndpoint, 2))[1]);
+        TestTransfer late = TestTransfer::In(BulkInEndpoint, 64);
         device->Submit(late);
-        Do(*device, WaitedTransfer(Request::ButtonReport, {}));
-        EXPECT_EQ(0, late.Completions());
+        Do(*device, TestTransfer::Vendor(Request::ButtonReport, {}));
+        EXPECT_EQ(0, late.completions);
         device->Cancel(late);
         ASSERT_TRUE(late.Wait());
         EXPECT_EQ(TransferStatus::Cancelled, late.status);
         EXPECT_EQ(62U, late.actualLength);
 
-        Do(*device, WaitedTransfer(Request::Reset, {31}));
-        WaitedTransfer gone(Request::Reset, {31});
+        Do(*device, TestTransfer::Vendor(Request::Reset, {31}));
+        TestTransfer gone = TestTransfer::Vendor(Request::Reset, {31});
         ASSERT_EQ(Errors::Success, device->Submit(gone));
         ASSERT_TRUE(gone.Wait());
         EXPECT_EQ(TransferStatus::DeviceGone, gone.status);
@@ -277,7 +226,7 @@ TEST_F(UsbIpServerTest, SlowPeerDoesNotHoldUpTheOthers) {
 
     const auto device = OpenAndClaim(other);
     for (int i = 0; i < 20; ++i) {
-        Do(*device, WaitedTransfer(Request::Reset, {31}));
+        Do(*device, TestTransfer::Vendor(Request::Reset, {31}));
     }
     close(lazy);
 }
@@ -316,7 +265,7 @@ TEST_F(UsbIpServerTest, PeersWithOddMannersDoNoHarm) {
         code = device->Claim();
     }
     EXPECT_EQ(Errors::Success, code);
-    Do(*device, WaitedTransfer(Request::Reset, {31}));
+    Do(*device, TestTransfer::Vendor(Request::Reset, {31}));
     device->Release();
     for (int i = 0; i < 1000 && countFiles() > before; ++i) {
         usleep(1000);
@@ -349,30 +298,10 @@ TEST_F(UsbIpServerTest, TcpOffersAllOfThem) {
 
     const auto overTcp = Platform::Usb::MakeUsbIpDevice(connect, "1-2");
     EXPECT_EQ(Errors::Success, overTcp->Claim());
-    Do(*overTcp, WaitedTransfer(Request::Reset, {31}));
+    Do(*overTcp, TestTransfer::Vendor(Request::Reset, {31}));
     EXPECT_EQ(Errors::Busy, Open(other)->Claim()) << "one import, whichever way it came";
     EXPECT_EQ(Errors::Success, Open(name)->Claim());
     EXPECT_EQ(Errors::DeviceNotConnected, Platform::Usb::MakeUsbIpDevice(connect, "1-3")->Claim());
-}
-
-TEST_F(UsbIpServerTest, GivenSocketNeedsNoImport) {
-    const auto instrument = server.Add(name);
-    int files[2] = {-1, -1};
-    ASSERT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, files));
-    server.Do([&] { server.Server().Serve(files[0], name, "the test"); });
-    EXPECT_EQ(Errors::Busy, Open(name)->Claim());
-    EXPECT_EQ("the test", Describe(name).usedBy);
-    UsbIp::SubmitPacket packet;
-    packet.sequence = 7;
-    packet.in = true;
-    packet.length = 8;
-    packet.setup = {Protocol::VendorIn, static_cast<std::uint8_t>(Request::GetChipId), 0, 0, 8};
-    const UsbIp::PacketBytes bytes = UsbIp::Encode(packet);
-    send(files[1], bytes.data(), bytes.size(), 0);
-    Bytes reply(48 + 8);
-    EXPECT_EQ(static_cast<ssize_t>(reply.size()), recv(files[1], reply.data(), reply.size(), MSG_WAITALL));
-    EXPECT_TRUE(std::ranges::equal(instrument->Settings().chipId, std::span(reply).last(8)));
-    close(files[1]);
 }
 
 TEST_F(UsbIpServerTest, AnotherUsersSimulatorIsSeenAndNotUsed) {

@@ -15,7 +15,7 @@
 #include <vector>
 
 #include "Platform/Usb/UsbIpDevice.h"
-#include "Platform/Usb/WaitedTransfer.h"
+#include "Support/TestTransfer.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
@@ -24,6 +24,7 @@ using Bytes = std::vector<std::uint8_t>;
 using Clock = std::chrono::steady_clock;
 using Protocol::BulkInEndpoint;
 using Protocol::BulkOutEndpoint;
+using Tests::TestTransfer;
 
 template <class Array>
 Bytes operator+(Bytes bytes, const Array& more) {
@@ -111,8 +112,8 @@ TEST_F(UsbIpDeviceTest, ImportAndPacketsAreWhatTheProtocolSays) {
     EXPECT_EQ(Errors::Success, device->Claim()) << "it is this device's already";
     EXPECT_EQ((Bytes{0x01, 0x11, 0x80, 0x03, 0, 0, 0, 0, '1', '-', '1'} + Bytes(29)), PeerReceives(40));
 
-    WaitedTransfer request(Protocol::Request::Reset, {31});
-    WaitedTransfer readout(BulkInEndpoint, WaitedTransfer::Room(256));
+    TestTransfer request = TestTransfer::Vendor(Protocol::Request::Reset, {31});
+    TestTransfer readout = TestTransfer::In(BulkInEndpoint, 256);
     ASSERT_EQ(Errors::Success, device->Submit(request));
     ASSERT_EQ(Errors::Success, device->Submit(readout));
 
@@ -131,7 +132,7 @@ TEST_F(UsbIpDeviceTest, ImportAndPacketsAreWhatTheProtocolSays) {
     ASSERT_TRUE(readout.Wait());
     EXPECT_EQ(TransferStatus::Completed, readout.status);
     EXPECT_EQ((Bytes{7, 8, 9}), readout.Data());
-    EXPECT_EQ(0, request.Completions());
+    EXPECT_EQ(0, request.completions);
     PeerSends(UsbIp::Encode(UsbIp::SubmitReply{first.sequence, -32, 0}));
     ASSERT_TRUE(request.Wait());
     EXPECT_EQ(TransferStatus::Stalled, request.status);
@@ -152,7 +153,7 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
              Case{"unlinked with data", -104, {1, 2}, 0, TransferStatus::Cancelled},
              Case{"the peer believes it has answered", std::nullopt, {}, 0, TransferStatus::Cancelled},
          }) {
-        WaitedTransfer transfer(BulkInEndpoint, WaitedTransfer::Room(4));
+        TestTransfer transfer = TestTransfer::In(BulkInEndpoint, 4);
         ASSERT_EQ(Errors::Success, device->Submit(transfer));
         const auto submit = PeerReceivesPacket<UsbIp::SubmitPacket>();
         device->Cancel(transfer);
@@ -172,12 +173,12 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
         device->Cancel(transfer);
     }
     // The connection has survived it, and nothing more was sent.
-    WaitedTransfer last(BulkInEndpoint, WaitedTransfer::Room(1));
+    TestTransfer last = TestTransfer::In(BulkInEndpoint, 1);
     device->Submit(last);
     const auto submit = PeerReceivesPacket<UsbIp::SubmitPacket>();
     PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 1}) + Bytes{9});
     ASSERT_TRUE(last.Wait());
-    EXPECT_EQ(1, last.Completions());
+    EXPECT_EQ(1, last.completions);
 }
 
 TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
@@ -217,8 +218,8 @@ TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
                   }},
          }) {
         const auto device = MakeClaimedDevice();
-        WaitedTransfer first(BulkInEndpoint, WaitedTransfer::Room(64));
-        WaitedTransfer second(BulkOutEndpoint, Bytes(64));
+        TestTransfer first = TestTransfer::In(BulkInEndpoint, 64);
+        TestTransfer second = TestTransfer::Out(BulkOutEndpoint, Bytes(64));
         ASSERT_EQ(Errors::Success, device->Submit(first));
         ASSERT_EQ(Errors::Success, device->Submit(second));
         test.misdeed(PeerReceivesPacket<UsbIp::SubmitPacket>());
@@ -226,7 +227,7 @@ TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
         ASSERT_TRUE(second.Wait()) << test.name;
         EXPECT_EQ(TransferStatus::DeviceGone, first.status) << test.name;
         EXPECT_EQ(TransferStatus::DeviceGone, second.status) << test.name;
-        WaitedTransfer after(BulkInEndpoint, WaitedTransfer::Room(64));
+        TestTransfer after = TestTransfer::In(BulkInEndpoint, 64);
         EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(after)) << test.name;
         EXPECT_EQ(Errors::DeviceNotConnected, device->Claim()) << test.name;
         device->Release();
@@ -236,8 +237,8 @@ TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
 
 TEST_F(UsbIpDeviceTest, SilentPeerDoesNotHoldUpACancellation) {
     const auto device = MakeClaimedDevice();
-    WaitedTransfer cancelled(BulkInEndpoint, WaitedTransfer::Room(64));
-    WaitedTransfer other(Protocol::InterruptInEndpoint, WaitedTransfer::Room(1));
+    TestTransfer cancelled = TestTransfer::In(BulkInEndpoint, 64);
+    TestTransfer other = TestTransfer::In(Protocol::InterruptInEndpoint, 1);
     device->Submit(cancelled);
     device->Submit(other);
     EXPECT_FALSE(other.Wait(std::chrono::milliseconds(100)));
@@ -252,13 +253,13 @@ TEST_F(UsbIpDeviceTest, SilentPeerDoesNotHoldUpACancellation) {
 
 TEST_F(UsbIpDeviceTest, PeerThatDoesNotReadDoesNotHoldUpASubmission) {
     const auto device = MakeClaimedDevice();
-    WaitedTransfer large(BulkOutEndpoint, Bytes(4U << 20));
+    TestTransfer large = TestTransfer::Out(BulkOutEndpoint, Bytes(4U << 20));
     const auto start = Clock::now();
     ASSERT_EQ(Errors::Success, device->Submit(large));
     ASSERT_TRUE(large.Wait());
     EXPECT_LT(Clock::now() - start, std::chrono::seconds(5));
     EXPECT_EQ(TransferStatus::DeviceGone, large.status);
-    WaitedTransfer tooLarge(BulkOutEndpoint, Bytes(UsbIp::MaximumPayload + std::size_t{1}));
+    TestTransfer tooLarge = TestTransfer::Out(BulkOutEndpoint, Bytes(UsbIp::MaximumPayload + std::size_t{1}));
     EXPECT_EQ(Errors::InvalidParameter, device->Submit(tooLarge));
 }
 
@@ -286,7 +287,7 @@ TEST_F(UsbIpDeviceTest, ImportFailuresAreToldApart) {
         const auto start = Clock::now();
         EXPECT_EQ(test.expected, device->Claim()) << test.name;
         EXPECT_LT(Clock::now() - start, std::chrono::seconds(5)) << test.name;
-        WaitedTransfer transfer(BulkInEndpoint, WaitedTransfer::Room(1));
+        TestTransfer transfer = TestTransfer::In(BulkInEndpoint, 1);
         EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(transfer)) << test.name;
     }
     const auto unreachable = MakeUsbIpDevice(
@@ -301,13 +302,13 @@ TEST_F(UsbIpDeviceTest, ImportFailuresAreToldApart) {
 TEST_F(UsbIpDeviceTest, ReleaseEndsTransfersAndLeavesNothingBehind) {
     const std::size_t threads = CountEntries("/proc/self/task");
     const std::size_t files = CountEntries("/proc/self/fd");
-    WaitedTransfer transfer(BulkInEndpoint, WaitedTransfer::Room(64));
+    TestTransfer transfer = TestTransfer::In(BulkInEndpoint, 64);
     {
         const auto device = MakeClaimedDevice();
         EXPECT_EQ(threads + 1, CountEntries("/proc/self/task"));
         device->Submit(transfer);
     }
-    EXPECT_EQ(1, transfer.Completions());
+    EXPECT_EQ(1, transfer.completions);
     EXPECT_EQ(TransferStatus::Cancelled, transfer.status);
     ClosePeer();
     EXPECT_EQ(threads, CountEntries("/proc/self/task"));
