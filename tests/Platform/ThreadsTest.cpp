@@ -1,10 +1,8 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
-#include <vector>
 
 #include "EachClock.h"
-#include "Platform/CallFilter.h"
 #include "Platform/ErrorCodes.h"
 #include "Platform/Threads.h"
 #include "Support/ResourceCount.h"
@@ -31,15 +29,6 @@ TEST_P(Threads, AreSignalledForGoodOnceTheyEnded) {
     EXPECT_EQ(Wait(thread.Get(), LongTimeout), WaitResult::Signalled);
     EXPECT_TRUE(ran);
     EXPECT_EQ(Wait(thread.Get(), 0), WaitResult::Signalled);
-}
-
-TEST_P(Threads, OfClosedHandlesRunOn) {
-    std::atomic<bool> ran = false;
-    EXPECT_TRUE(Close(StartThread(SetFlagLater, &ran)));
-    for (int i = 0; i < 1000 && !ran; ++i) {
-        SleepMilliseconds(5);
-    }
-    EXPECT_TRUE(ran);
 }
 
 TEST_P(Threads, RememberTheirPriority) {
@@ -96,17 +85,6 @@ TEST_P(Threads, LeaveNothingBehind) {
         }
     }
     EXPECT_TRUE(before.Settles()) << before << " before, " << ResourceCount::Take() << " after";
-}
-
-TEST(ThreadCalls, CanBeMadeToFail) {
-    InstallCallFilter(
-        [](std::string_view name) { return name == "StartThread" ? Errors::NotEnoughMemory : 0; });
-    std::atomic<bool> ran = false;
-    EXPECT_EQ(StartThread(SetFlagLater, &ran), NoHandle);
-    EXPECT_EQ(LastError(), Errors::NotEnoughMemory);
-    InstallCallFilter({});
-    SleepMilliseconds(30);
-    EXPECT_FALSE(ran);
 }
 
 }  // namespace

@@ -2,8 +2,6 @@
 
 #include <chrono>
 #include <ctime>
-#include <utility>
-#include <vector>
 
 #include "EachClock.h"
 #include "Platform/EventScheduler.h"
@@ -54,16 +52,6 @@ TEST(Calendar, IsLocalTime) {
 TEST(WallClock, IsTheSystems) {
     const auto expected = std::chrono::system_clock::to_time_t(std::chrono::system_clock::now());
     EXPECT_NEAR(static_cast<double>(WallClockNow().seconds), static_cast<double>(expected), 2);
-}
-
-TEST(Beeps, CanBeObserved) {
-    std::vector<std::pair<std::uint32_t, std::uint32_t>> beeps;
-    ObserveBeeps(
-        [&](std::uint32_t hertz, std::uint32_t milliseconds) { beeps.emplace_back(hertz, milliseconds); });
-    Beep(1000, 200);
-    Beep(440, 0);
-    ObserveBeeps({});
-    EXPECT_EQ(beeps, (std::vector<std::pair<std::uint32_t, std::uint32_t>>{{1000, 200}, {440, 0}}));
 }
 
 }  // namespace

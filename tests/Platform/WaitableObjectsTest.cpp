@@ -3,6 +3,7 @@
 #include <array>
 #include <atomic>
 #include <deque>
+#include <functional>
 #include <vector>
 
 #include "EachClock.h"
@@ -48,24 +49,53 @@ TEST_P(Events, KeepOneSignalForOneWait) {
     EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
 }
 
-TEST_P(Events, SignalsInARowEndAsManyWaits) {
-    constexpr int Threads = 4;
-    const OwnedHandle event(MakeAutoResetEvent());
+/// Ends the threads that wait for an object by as many `signals`, and expects that it had no more.
+void ExpectOneWaitPerSignal(Handle object, int threadCount, const std::function<void()>& signals) {
     std::atomic<int> ended = 0;
     std::deque<TestThread> threads;
-    for (int i = 0; i < Threads; ++i) {
+    for (int i = 0; i < threadCount; ++i) {
         threads.emplace_back([&] {
-            EXPECT_EQ(Wait(event.Get(), LongTimeout), WaitResult::Signalled);
+            EXPECT_EQ(Wait(object, LongTimeout), WaitResult::Signalled);
             ++ended;
         });
     }
     SleepMilliseconds(SettlingTime);
-    for (int i = 0; i < Threads; ++i) {
-        EXPECT_TRUE(SignalEvent(event.Get()));
-    }
+    signals();
     threads.clear();
-    EXPECT_EQ(ended, Threads);
-    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
+    EXPECT_EQ(ended, threadCount);
+    EXPECT_EQ(Wait(object, 0), WaitResult::TimedOut);
+}
+
+/// Several threads count, one at a time.
+template <class Enter, class Leave>
+void ExpectExclusion(Enter enter, Leave leave) {
+    int counter = 0;
+    const auto count = [&] {
+        for (int i = 0; i < 300; ++i) {
+            enter();
+            const int before = counter;
+            if (i % 16 == 0) {
+                SleepMilliseconds(0);
+            }
+            counter = before + 1;
+            leave();
+        }
+    };
+    {
+        TestThread first(count);
+        TestThread second(count);
+        TestThread third(count);
+    }
+    EXPECT_EQ(counter, 900);
+}
+
+TEST_P(Events, SignalsInARowEndAsManyWaits) {
+    const OwnedHandle event(MakeAutoResetEvent());
+    ExpectOneWaitPerSignal(event.Get(), 4, [&] {
+        for (int i = 0; i < 4; ++i) {
+            EXPECT_TRUE(SignalEvent(event.Get()));
+        }
+    });
 }
 
 TEST_P(Waits, LastAsLongAsTheirTimeout) {
@@ -239,24 +269,8 @@ TEST_P(Mutexes, AreHandedOnWhenTheirOwnerEnds) {
 TEST_P(Mutexes, ExcludeThreads) {
     for (const std::string& name : {std::string(), NameFor("exclusion")}) {
         const OwnedHandle mutex(MakeMutex(name));
-        int counter = 0;
-        const auto count = [&] {
-            for (int i = 0; i < 300; ++i) {
-                EXPECT_EQ(Wait(mutex.Get(), LongTimeout), WaitResult::Signalled);
-                const int before = counter;
-                if (i % 16 == 0) {
-                    SleepMilliseconds(0);
-                }
-                counter = before + 1;
-                EXPECT_TRUE(ReleaseMutex(mutex.Get()));
-            }
-        };
-        {
-            TestThread first(count);
-            TestThread second(count);
-            TestThread third(count);
-        }
-        EXPECT_EQ(counter, 900);
+        ExpectExclusion([&] { EXPECT_EQ(Wait(mutex.Get(), LongTimeout), WaitResult::Signalled); },
+                        [&] { EXPECT_TRUE(ReleaseMutex(mutex.Get())); });
     }
 }
 
@@ -280,23 +294,12 @@ TEST_P(Semaphores, CountUpToTheirMaximum) {
 }
 
 TEST_P(Semaphores, LetAsManyThreadsPassAsAreReleased) {
-    constexpr std::int32_t Threads = 3;
     const OwnedHandle semaphore(MakeSemaphore(0, 0x7FFFFFFF, ""));
-    std::atomic<int> passed = 0;
-    std::deque<TestThread> threads;
-    for (int i = 0; i < Threads; ++i) {
-        threads.emplace_back([&] {
-            EXPECT_EQ(Wait(semaphore.Get(), LongTimeout), WaitResult::Signalled);
-            ++passed;
-        });
-    }
-    SleepMilliseconds(SettlingTime);
-    EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), Threads - 1));
-    SleepMilliseconds(SettlingTime);
-    EXPECT_EQ(passed, Threads - 1);
-    EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 1));
-    threads.clear();
-    EXPECT_EQ(passed, Threads);
+    ExpectOneWaitPerSignal(semaphore.Get(), 3, [&] {
+        EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 2));
+        SleepMilliseconds(SettlingTime);
+        EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 1));
+    });
 }
 
 TEST_P(Semaphores, RefuseImpossibleCounts) {
@@ -365,26 +368,9 @@ TEST_P(SignalAndWaits, LoseNoSignal) {
     SignalEvent(second.Get());
 }
 
-TEST_P(CriticalSections, AreRecursiveAndExclude) {
+TEST_P(CriticalSections, ExcludeThreads) {
     CriticalSection section;
-    int counter = 0;
-    const auto count = [&] {
-        for (int i = 0; i < 300; ++i) {
-            const CriticalSection::Holder outer(section);
-            const CriticalSection::Holder inner(section);
-            const int before = counter;
-            if (i % 16 == 0) {
-                SleepMilliseconds(0);
-            }
-            counter = before + 1;
-        }
-    };
-    {
-        TestThread first(count);
-        TestThread second(count);
-        TestThread third(count);
-    }
-    EXPECT_EQ(counter, 900);
+    ExpectExclusion([&] { section.Enter(); }, [&] { section.Leave(); });
 }
 
 TEST_P(CriticalSections, HoldOthersUpUntilTheLastLeave) {
@@ -404,6 +390,10 @@ TEST_P(CriticalSections, HoldOthersUpUntilTheLastLeave) {
     EXPECT_TRUE(entered);
 }
 
+std::uint32_t Nothing(void*) {
+    return 0;
+}
+
 TEST(CallFilters, MakeCallsFailWithoutTouchingTheSystem) {
     const OwnedHandle event(MakeAutoResetEvent());
     const OwnedHandle mutex(MakeMutex(""));
@@ -414,6 +404,7 @@ TEST(CallFilters, MakeCallsFailWithoutTouchingTheSystem) {
         std::string_view name;
         std::function<bool()> succeeds;
     } const calls[] = {
+        {"StartThread", [&] { return static_cast<bool>(OwnedHandle(StartThread(&Nothing, nullptr))); }},
         {"MakeAutoResetEvent", [&] { return static_cast<bool>(OwnedHandle(MakeAutoResetEvent())); }},
         {"MakeMutex", [&] { return static_cast<bool>(OwnedHandle(MakeMutex(""))); }},
         {"MakeSemaphore", [&] { return static_cast<bool>(OwnedHandle(MakeSemaphore(0, 1, ""))); }},

@@ -33,35 +33,6 @@ class InterruptibleDeviceFilesTest : public DriverFixture {
     InterruptibleDeviceFiles* interruptible = nullptr;
 };
 
-TEST_F(InterruptibleDeviceFilesTest, EndsReadsOfTheInstrumentsOwnDriver) {
-    const Platform::Handle control = Open("native/port1");
-    const Platform::Handle pipe = OpenPipe(1);
-    Bytes first(64), second(64);
-    Request one, other;
-    StartPending(pipe, first, one);
-    StartPending(pipe, second, other);
-    interruptible->Interrupt();
-    EXPECT_EQ(Result(pipe, one), (Outcome{Errors::OperationAborted, 0}));
-    EXPECT_EQ(Result(pipe, other), (Outcome{Errors::OperationAborted, 0}));
-    EXPECT_EQ(device->Pending(BulkInEndpoint), 0u);
-    EXPECT_TRUE(files->CloseFile(pipe));
-    EXPECT_TRUE(files->CloseFile(control));
-}
-
-TEST_F(InterruptibleDeviceFilesTest, EndsReadsOfTheUsbIoDriver) {
-    const Platform::Handle data = OpenBound(BulkInEndpoint);
-    const Platform::Handle button = OpenBound(InterruptInEndpoint);
-    Bytes first(64), second(8);
-    Request one, other;
-    StartPending(data, first, one);
-    StartPending(button, second, other);
-    interruptible->Interrupt();
-    EXPECT_EQ(Result(data, one), (Outcome{Status::Cancelled, 0}));
-    EXPECT_EQ(Result(button, other), (Outcome{Status::Cancelled, 0}));
-    EXPECT_TRUE(files->CloseFile(data));
-    EXPECT_TRUE(files->CloseFile(button));
-}
-
 TEST_F(InterruptibleDeviceFilesTest, NothingStartsUntilItIsResumed) {
     const Platform::Handle control = Open("native/port1");
     const Platform::Handle pipe = OpenPipe(1);

@@ -72,32 +72,6 @@ TEST_F(NativeDriver, OpenPassesOnWhyTheDeviceCannotBeHad) {
     EXPECT_EQ(OpenError("native/port1"), Errors::Success);
 }
 
-TEST_F(NativeDriver, CarriesVendorRequests) {
-    device->Expect({
-        VendorOut(0xC0, {}),
-        VendorOut(0xCA, {0x1F}),
-        VendorOut(0xC1, Counting(8), 0x1234, 0xABCD),
-        VendorOut(0xA0, Counting(65535), 0x2000),
-        VendorIn(0xC2, 8, Counting(8, 1)),
-        VendorIn(0xD1, 6, {9, 8}),
-    });
-    const auto file = Open("native/port1");
-    const auto send = [&](const Bytes& block, Bytes data) {
-        return Control(file, Native::ControlVendorRequest, block, data);
-    };
-    EXPECT_EQ(send(NativeBlock(0xC0, 0), {}), (Outcome{0, 0}));
-    EXPECT_EQ(send(NativeBlock(0xCA, 0), {0x1F}), (Outcome{0, 1}));
-    EXPECT_EQ(send(NativeBlock(0xC1, 0, 0x1234, 0xABCD), Counting(8)), (Outcome{0, 8}));
-    EXPECT_EQ(send(NativeBlock(0xA0, 0, 0x2000), Counting(65535)), (Outcome{0, 65535}));
-
-    Bytes answer(8);
-    EXPECT_EQ(Control(file, Native::ControlVendorRequest, NativeBlock(0xC2, 1), answer), (Outcome{0, 8}));
-    EXPECT_EQ(answer, Counting(8, 1));
-    answer.assign(6, 0x55);
-    EXPECT_EQ(Control(file, Native::ControlVendorRequest, NativeBlock(0xD1, 1), answer), (Outcome{0, 2}));
-    EXPECT_EQ(answer, (Bytes{9, 8, 0x55, 0x55, 0x55, 0x55}));
-}
-
 TEST_F(NativeDriver, RefusesWhatAFileDoesNotTake) {
     const auto refused = [this](Platform::Handle file, std::uint32_t code, const Bytes& input,
                                 std::size_t outputSize = 0) {
@@ -135,64 +109,11 @@ TEST_F(NativeDriver, RefusesWhatAFileDoesNotTake) {
     }
     Bytes data(4);
     for (std::uint32_t pipe = 1; pipe <= 3; ++pipe) {
-        const auto file = OpenPipe(pipe);
-        EXPECT_EQ(refused(file, Native::ControlVendorRequest, good), Errors::InvalidFunction) << pipe;
-        const bool isWritten = pipe == Native::WritePipe;
-        EXPECT_EQ((isWritten ? Read(file, data) : Write(file, data)).code, Errors::InvalidFunction) << pipe;
+        EXPECT_EQ(refused(OpenPipe(pipe), Native::ControlVendorRequest, good), Errors::InvalidFunction)
+            << pipe;
     }
     EXPECT_EQ(Read(main, data).code, Errors::InvalidFunction);
     EXPECT_EQ(Write(main, data).code, Errors::InvalidFunction);
-}
-
-TEST_F(NativeDriver, PipesAreEndpoints) {
-    device->Expect({
-        BulkIn(256, Counting(256)),
-        BulkOut(Counting(256, 7)),
-        BulkOut({0}),
-        BulkOut({}),
-        BulkIn(512, Counting(100)),
-        BulkIn(8, {0x42}, Protocol::InterruptInEndpoint),
-    });
-    const auto readPipe = OpenPipe(Native::ReadPipe);
-    const auto writePipe = OpenPipe(Native::WritePipe);
-    const auto interruptPipe = OpenPipe(Native::InterruptPipe);
-
-    Bytes buffer(256);
-    EXPECT_EQ(Read(readPipe, buffer), (Outcome{0, 256}));
-    EXPECT_EQ(buffer, Counting(256));
-    EXPECT_EQ(Write(writePipe, Counting(256, 7)), (Outcome{0, 256}));
-    EXPECT_EQ(Write(writePipe, {0}), (Outcome{0, 1}));
-    EXPECT_EQ(Write(writePipe, {}), (Outcome{0, 0})) << "an empty packet";
-    Bytes none;
-    EXPECT_EQ(Read(readPipe, none), (Outcome{0, 0})) << "nothing to ask the device for";
-    buffer.assign(512, 0);
-    EXPECT_EQ(Read(readPipe, buffer), (Outcome{0, 100}));
-    buffer.assign(8, 0);
-    EXPECT_EQ(Read(interruptPipe, buffer), (Outcome{0, 1}));
-    EXPECT_EQ(buffer[0], 0x42);
-}
-
-TEST_F(NativeDriver, AbortEndsTheTransfersOfTheNamedEndpoint) {
-    device->LeaveToTest(Protocol::InterruptInEndpoint);
-    device->LeaveToTest(Protocol::BulkInEndpoint);
-    const auto main = Open("native/port1");
-    const auto readPipe = OpenPipe(Native::ReadPipe);
-    const auto interruptPipe = OpenPipe(Native::InterruptPipe);
-    Bytes read(64), interrupts[2] = {Bytes(8), Bytes(8)};
-    Request reading, listening[2];
-    StartPending(readPipe, read, reading);
-    StartPending(interruptPipe, interrupts[0], listening[0]);
-    StartPending(interruptPipe, interrupts[1], listening[1]);
-
-    Bytes undefined(8, 0x77);
-    EXPECT_EQ(Control(main, Native::ControlAbortPipe, NativeBlock(0, 0, 0x84, 0, 0), undefined),
-              (Outcome{0, 0}));
-    EXPECT_EQ(Result(interruptPipe, listening[0], true), (Outcome{Errors::OperationAborted, 0}));
-    EXPECT_EQ(Result(interruptPipe, listening[1], true), (Outcome{Errors::OperationAborted, 0}));
-    EXPECT_EQ(Result(readPipe, reading), (Outcome{Errors::IoIncomplete, 0}));
-
-    device->Send(Protocol::BulkInEndpoint, {1, 2, 3});
-    EXPECT_EQ(Result(readPipe, reading, true), (Outcome{0, 3}));
 }
 
 TEST_F(NativeDriver, ButtonReportHasNoDataStage) {
@@ -201,35 +122,6 @@ TEST_F(NativeDriver, ButtonReportHasNoDataStage) {
     Bytes undefined(8, 0x77);
     EXPECT_EQ(Control(main, Native::ControlButtonReport, NativeBlock(0xD0, 0, 3), undefined),
               (Outcome{0, 0}));
-}
-
-TEST_F(NativeDriver, HasACodeForEveryOutcome) {
-    const struct {
-        TransferStatus status;
-        Platform::ErrorCode code;
-    } cases[] = {
-        {TransferStatus::Completed, Errors::Success},
-        {TransferStatus::Stalled, Errors::GeneralFailure},
-        {TransferStatus::IoError, Errors::GeneralFailure},
-        {TransferStatus::Overflow, Errors::GeneralFailure},
-        {TransferStatus::Cancelled, Errors::OperationAborted},
-        {TransferStatus::DeviceGone, Errors::DeviceNotConnected},
-    };
-    const auto main = Open("native/port1");
-    const auto readPipe = OpenPipe(Native::ReadPipe);
-    for (const auto& row : cases) {
-        device->Expect(
-            {BulkIn(16, Counting(16)).Ends(row.status, 5), VendorOut(0xC0, {1, 2}).Ends(row.status, 1)});
-        if (row.status == TransferStatus::Stalled) {
-            device->Expect({HaltCleared(Protocol::BulkInEndpoint)});
-        }
-        Bytes buffer(16), data{1, 2};
-        EXPECT_EQ(Read(readPipe, buffer), (Outcome{row.code, 5})) << static_cast<int>(row.status);
-        EXPECT_EQ(buffer[4], 4) << "what has moved counts, whatever the end";
-        EXPECT_EQ(Control(main, Native::ControlVendorRequest, NativeBlock(0xC0, 0), data),
-                  (Outcome{row.code, 1}))
-            << static_cast<int>(row.status);
-    }
 }
 
 TEST_F(NativeDriver, ClearsAHaltBeforeTheNextTransferOrTheEnd) {

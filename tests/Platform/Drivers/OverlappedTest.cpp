@@ -301,19 +301,5 @@ TEST_F(OverlappedFiles, RunOutOfPlacesAndRecover) {
     }
 }
 
-TEST_F(OverlappedFiles, ServeOverlappedRequests) {
-    device->LeaveToTest(In);
-    const Platform::ScopedDeviceFiles scope(*files);
-    const auto pipe = OpenPipe(Native::ReadPipe);
-    const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
-    {
-        Bytes buffer(8);
-        Platform::OverlappedRequest request(event.Get());
-        EXPECT_FALSE(request.StartRead(pipe, buffer.data(), 8));
-        EXPECT_EQ(device->Pending(In), 1u);
-    }
-    EXPECT_EQ(device->Pending(In), 0u) << "the request has ended its transfer";
-}
-
 }  // namespace
 }  // namespace Varnholt::Tests

@@ -35,47 +35,6 @@ TEST(VirtualTime, PassesWhileAllWait) {
     EXPECT_LT(std::chrono::steady_clock::now() - realStart, std::chrono::seconds(5));
 }
 
-TEST(VirtualTime, ManyTimeoutsCostNextToNothing) {
-    VirtualClock clock(1);
-    const OwnedHandle event(MakeAutoResetEvent());
-    const auto realStart = std::chrono::steady_clock::now();
-    for (int i = 0; i < 10'000; ++i) {
-        ASSERT_EQ(Wait(event.Get(), 5000), WaitResult::TimedOut);
-    }
-    EXPECT_EQ(clock.ElapsedMilliseconds(), 50'000'000u);
-    EXPECT_LT(std::chrono::steady_clock::now() - realStart, std::chrono::seconds(5));
-}
-
-TEST(VirtualTime, EventsComeInOrderOfTimeWithoutLocks) {
-    VirtualClock clock(1);
-    EventScheduler& scheduler = ClockScheduler();
-    const std::uint64_t start = scheduler.Now();
-    CriticalSection section;
-    const OwnedHandle done(MakeAutoResetEvent());
-    std::vector<std::string> calls;
-    const auto note = [&](const std::string& text) {
-        const CriticalSection::Holder holder(section);
-        calls.push_back(text + "@" + std::to_string(scheduler.Now() - start));
-    };
-    scheduler.CallAt(start + 300, [&] {
-        note("third");
-        SignalEvent(done.Get());
-    });
-    scheduler.CallAt(start + 100, [&] {
-        note("first");
-        scheduler.CallAt(start + 100, [&] { note("from first"); });
-    });
-    const auto dropped = scheduler.CallAt(start + 150, [&] { note("dropped"); });
-    scheduler.CallAt(start + 200, [&] {
-        note("second");
-        scheduler.Forget(dropped);
-    });
-    scheduler.Forget(dropped);
-    EXPECT_THAT(calls, ElementsAre());
-    EXPECT_EQ(Wait(done.Get(), 5000), WaitResult::Signalled);
-    EXPECT_THAT(calls, ElementsAre("first@100", "from first@100", "second@200", "third@300"));
-}
-
 /// A lock of the thread on whose stack an event is called is not the event's.
 TEST(VirtualTime, EventIsNotTheThreadThatHostsIt) {
     VirtualClock clock(1);
@@ -226,24 +185,6 @@ TEST(VirtualTime, PollingComesToAnEnd) {
         SleepMilliseconds(0);
     }
     EXPECT_EQ(clock.ElapsedMilliseconds(), 2u);
-}
-
-TEST(VirtualTime, ForgetWaitsForTheRunningEvent) {
-    for (std::uint64_t seed = 0; seed < 10; ++seed) {
-        VirtualClock clock(seed);
-        const OwnedHandle running(MakeAutoResetEvent());
-        bool over = false;
-        const auto id = ClockScheduler().CallAt(0, [&] {
-            SignalEvent(running.Get());
-            SleepMilliseconds(5);
-            over = true;
-        });
-        TestThread other([&] {
-            EXPECT_EQ(Wait(running.Get(), Infinite), WaitResult::Signalled);
-            ClockScheduler().Forget(id);
-            EXPECT_TRUE(over);
-        });
-    }
 }
 
 }  // namespace
