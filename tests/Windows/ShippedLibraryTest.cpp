@@ -120,26 +120,6 @@ Values ReadoutInProcess(std::uint64_t seed) {
     return values;
 }
 
-TEST_F(Shipped, FunctionsAreFoundByNameAndByOrdinal) {
-    const std::pair<const char*, std::uintptr_t> exports[] = {
-        {"d4fb86cecc88582a", 5}, {"b5ae189db26b2a1b", 6}, {"c288a3930ffaa9d7", 7}, {"f3355d91d5df0e0b", 8}};
-    for (const auto& [name, ordinal] : exports) {
-        const auto byName = GetProcAddress(library->module, name);
-        EXPECT_NE(byName, nullptr) << name;
-        EXPECT_EQ(byName, GetProcAddress(library->module, reinterpret_cast<const char*>(ordinal))) << name;
-    }
-    for (const std::uintptr_t other : {1U, 4U, 9U}) {
-        EXPECT_EQ(GetProcAddress(library->module, reinterpret_cast<const char*>(other)), nullptr);
-    }
-}
-
-TEST_F(Shipped, WithoutInstrumentsThereIsNothingToSay) {
-    EXPECT_EQ(TakeReadout(""), OSTRA_FAILURE);
-    EXPECT_EQ(library->LastError(), "");
-    EXPECT_EQ(WriteImage(MakeImage(1), ""), OSTRA_UNKNOWN_FAILURE);
-    EXPECT_EQ(library->LastError(), "");
-}
-
 TEST_F(Shipped, ReadoutIsTheSameAsInProcess) {
     const std::string path = driver->PlugIn();
     Instrument(path).TakeTranscript();

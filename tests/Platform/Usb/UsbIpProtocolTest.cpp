@@ -144,18 +144,6 @@ TEST(UsbIpProtocolTest, DeviceRecordsAreCutToTheirFields) {
     EXPECT_EQ(std::string(32, 'z'), UsbIp::DecodeBusId(unterminated));
 }
 
-TEST(UsbIpProtocolTest, StatusesAreLinuxErrorNumbers) {
-    for (const TransferStatus status :
-         {TransferStatus::Completed, TransferStatus::Stalled, TransferStatus::IoError,
-          TransferStatus::Overflow, TransferStatus::Cancelled, TransferStatus::DeviceGone}) {
-        EXPECT_EQ(status, UsbIp::TransferStatusOf(UsbIp::StatusOf(status)));
-    }
-    EXPECT_EQ(-32, UsbIp::StatusOf(TransferStatus::Stalled));
-    EXPECT_EQ(-104, UsbIp::StatusOf(TransferStatus::Cancelled));
-    EXPECT_EQ(TransferStatus::IoError, UsbIp::TransferStatusOf(-84));
-    EXPECT_EQ(TransferStatus::IoError, UsbIp::TransferStatusOf(12345));
-}
-
 TEST(UsbDescriptorsTest, OnlyTheFirstInterfaceCountsAndBrokenOnesEndTheSearch) {
     const Bytes interface0{9, 4, 0, 0, 1, 0xFF, 0, 0, 0};
     const Bytes alternate1{9, 4, 0, 1, 1, 0xFF, 0, 0, 0};

@@ -4,11 +4,9 @@
 
 #include <array>
 #include <cstring>
-#include <functional>
 #include <string>
 #include <thread>
 
-#include "Platform/CallFilter.h"
 #include "Platform/DeviceFiles.h"
 #include "Platform/OverlappedRequest.h"
 #include "Platform/WaitableObjects.h"
@@ -130,24 +128,6 @@ TEST_F(SystemDeviceFilesTest, PipeRefusesDeviceControls) {
     EXPECT_FALSE(
         SystemDeviceFiles().StartControl(file, 0x22000D, "0123456789", 10, firstBuffer.data(), 8, first));
     EXPECT_NE(LastError(), Errors::IoPending);
-}
-
-TEST_F(SystemDeviceFilesTest, EveryCallCanBeMadeToFail) {
-    const std::pair<const char*, std::function<bool()>> calls[] = {
-        {"Open", [] { return SystemDeviceFiles().Open(Path) != InvalidHandle(); }},
-        {"StartRead", [this] { return SystemDeviceFiles().StartRead(file, firstBuffer.data(), 8, first); }},
-        {"StartWrite", [this] { return SystemDeviceFiles().StartWrite(file, "a", 1, first); }},
-        {"StartControl",
-         [this] { return SystemDeviceFiles().StartControl(file, 1, nullptr, 0, nullptr, 0, first); }},
-        {"CancelTransfers", [this] { return SystemDeviceFiles().CancelTransfers(file); }},
-    };
-    for (const auto& [name, call] : calls) {
-        InstallCallFilter(
-            [&](std::string_view asked) { return asked == name ? Errors::NotReady : Errors::Success; });
-        EXPECT_FALSE(call()) << name;
-        EXPECT_EQ(LastError(), Errors::NotReady) << name;
-    }
-    InstallCallFilter({});
 }
 
 }  // namespace

@@ -5,10 +5,9 @@
 #include <cstring>
 #include <vector>
 
-#include "Platform/CallFilter.h"
 #include "Platform/DeviceInterfaces.h"
+#include "Platform/ErrorCodes.h"
 #include "Platform/HostQueries.h"
-#include "Platform/Time.h"
 #include "Platform/Win32/Windows.h"
 #include "Protocol/UsbIoDriver.h"
 
@@ -41,20 +40,6 @@ TEST(SystemQueries, ErrorTextsComeAsTheSystemGivesThem) {
     EXPECT_EQ(ErrorText(0xE0001000), "");
 }
 
-TEST(SystemQueries, LocalTimeAgreesWithTheSystem) {
-    SYSTEMTIME local{};
-    GetLocalTime(&local);
-    const CalendarTime now = LocalCalendarTime(WallClockNow().seconds);
-    EXPECT_EQ(now.year, local.wYear);
-    EXPECT_NEAR(now.day * 86400 + now.hour * 3600 + now.minute * 60 + now.second,
-                local.wDay * 86400 + local.wHour * 3600 + local.wMinute * 60 + local.wSecond, 2);
-    const CalendarTime billionth = LocalCalendarTime(1'000'000'000);
-    EXPECT_EQ(billionth.year, 2001);
-    EXPECT_EQ(billionth.month, 9);
-    EXPECT_EQ(billionth.minute, 46);
-    EXPECT_EQ(billionth.second, 40);
-}
-
 TEST(SystemInterfaces, ClassWithoutDevicesGivesAnEmptyList) {
     const DeviceList list = DeviceInterfaces::MakeList(InterfaceClass, false);
     ASSERT_NE(list, nullptr);
@@ -69,15 +54,6 @@ TEST(SystemInterfaces, ClassWithoutDevicesGivesAnEmptyList) {
     EXPECT_FALSE(DeviceInterfaces::Find(list, InterfaceClass, 0, record));
     EXPECT_EQ(LastError(), Errors::InvalidHandle);
     EXPECT_FALSE(DeviceInterfaces::DestroyList(list));
-}
-
-TEST(SystemInterfaces, RecordOfAnotherSizeIsRefused) {
-    const DeviceList list = DeviceInterfaces::MakeList(InterfaceClass, false);
-    InterfaceRecord record;
-    record.size = 32;
-    EXPECT_FALSE(DeviceInterfaces::Find(list, InterfaceClass, 0, record));
-    EXPECT_NE(LastError(), Errors::NoMoreItems);
-    DeviceInterfaces::DestroyList(list);
 }
 
 }  // namespace
