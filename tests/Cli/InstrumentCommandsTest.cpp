@@ -6,6 +6,7 @@ namespace {
 
 using Cli::ExitCode;
 using Simulator::InstrumentSettings;
+using testing::HasSubstr;
 
 InstrumentSettings Leisurely() {
     InstrumentSettings settings;
@@ -48,10 +49,8 @@ TEST_P(InstrumentCommandsTest, TheTransportCanBeChosenAndIsGivenBack) {
 TEST_P(InstrumentCommandsTest, ReadoutForms) {
     auto& instrument = host.Add("sim", Leisurely());
     Succeed({"readout", "--raw", "--output", folder.Path("raw")});
-    instrument.WithCommands([](const Simulator::Commands& commands) {
-        EXPECT_EQ(commands.parameters, (Simulator::MeasureParameters{294, 0, 1, 6}));
-        EXPECT_EQ(commands.resets, 1u);
-    });
+    EXPECT_EQ(ParametersOf(instrument), (Simulator::MeasureParameters{294, 0, 1, 6}));
+    EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 1u);
     const auto bytes = ReadFile(folder.Path("raw"));
     ASSERT_EQ(bytes.size(), 256u);
     host.Add("sim");  // the same noise once more for each
@@ -88,12 +87,12 @@ TEST_P(InstrumentCommandsTest, ReadoutForms) {
 TEST_P(InstrumentCommandsTest, ReadoutPlotsInTheCharactersOfTheTerminal) {
     host.Add("sim");
     Succeed({"readout", "--plot"});
-    EXPECT_NE(tool.Out().find('*'), std::string::npos);
+    EXPECT_THAT(tool.Out(), HasSubstr("*"));
     EXPECT_EQ(tool.Out().find("\xE2\xA0"), std::string::npos);
     tool.outFacts.showsUtf8 = true;
     Succeed({"readout", "--plot"});
     EXPECT_EQ(tool.Out().find('*'), std::string::npos);
-    EXPECT_NE(tool.Out().find("\xE2\xA0"), std::string::npos);
+    EXPECT_THAT(tool.Out(), HasSubstr("\xE2\xA0"));
     Succeed({"readout", "--plot", "--ascii"});
     EXPECT_EQ(tool.Out().find("\xE2\xA0"), std::string::npos);
 }
@@ -112,18 +111,14 @@ TEST_P(InstrumentCommandsTest, ReadoutRepeatsFromStartToStart) {
 TEST_P(InstrumentCommandsTest, ReadoutWithAnIntegrationTimeChoosesTheMode) {
     auto& instrument = host.Add("sim");
     Succeed({"readout", "--integration-time", "0.5"});
-    instrument.WithCommands([](const Simulator::Commands& commands) {
-        EXPECT_EQ(commands.mode, 1);
-        EXPECT_EQ(commands.parameters, (Simulator::MeasureParameters{7353, 0, 1, 6}));  // of 68 us
-    });
+    EXPECT_EQ(ModeOf(instrument), 1);
+    EXPECT_EQ(ParametersOf(instrument), (Simulator::MeasureParameters{7353, 0, 1, 6}));  // of 68 us
     Succeed({"readout", "--integration-time", "0.005"});
-    instrument.WithCommands([](const Simulator::Commands& commands) {
-        EXPECT_EQ(commands.mode, 2);
-        EXPECT_EQ(commands.parameters.p1, 147);  // of 34 us
-    });
+    EXPECT_EQ(ModeOf(instrument), 2);
+    EXPECT_EQ(ParametersOf(instrument).p1, 147);  // of 34 us
     Fail({"readout", "--integration-time", "60"}, ExitCode::BadData, "Integration time too high");
-    EXPECT_NE(tool.Err().find("mode 2: 0.00442 s to 2.22819 s"), std::string::npos) << tool.Err();
-    instrument.WithCommands([](const Simulator::Commands& commands) { EXPECT_EQ(commands.mode, 2); });
+    EXPECT_THAT(tool.Err(), HasSubstr("mode 2: 0.00442 s to 2.22819 s"));
+    EXPECT_EQ(ModeOf(instrument), 2);
 }
 
 TEST_P(InstrumentCommandsTest, Identify) {
@@ -139,7 +134,7 @@ TEST_P(InstrumentCommandsTest, Identify) {
     EXPECT_EQ(found["mode"][0], 3);
     EXPECT_EQ(found["parameters"][4], 0x55);
     Succeed({"identify"});
-    EXPECT_NE(tool.Out().find("5a0123456789abcd"), std::string::npos);
+    EXPECT_THAT(tool.Out(), HasSubstr("5a0123456789abcd"));
 }
 
 TEST_P(InstrumentCommandsTest, ResetSendsItsCodeAfterTheOneOfTheOpening) {
@@ -154,9 +149,8 @@ TEST_P(InstrumentCommandsTest, ResetSendsItsCodeAfterTheOneOfTheOpening) {
 
 TEST_P(InstrumentCommandsTest, MonitorReportsButtonAndRemoval) {
     auto& instrument = host.Add("sim");
-    auto& scheduler = Platform::ClockScheduler();
-    scheduler.CallAt(scheduler.Now() + 1'000'000, [&] { instrument.PressButton(); });
-    scheduler.CallAt(scheduler.Now() + 2'000'000, [&] { host.Bus().Unplug("sim"); });
+    After(1'000'000, [&] { instrument.PressButton(); });
+    After(2'000'000, [&] { host.Bus().Unplug("sim"); });
     Succeed({"monitor", "--json"});
     ASSERT_EQ(tool.Lines().size(), 2u) << tool.Out();
     const auto button = nlohmann::json::parse(tool.Lines()[0]);
@@ -173,8 +167,7 @@ TEST_P(InstrumentCommandsTest, MonitorEndsInTimeAndWithCtrlC) {
     EXPECT_EQ(tool.Out(), "");
     Cli::Interruption interruption;
     tool.interruption = &interruption;
-    auto& scheduler = Platform::ClockScheduler();
-    scheduler.CallAt(scheduler.Now() + 1'000'000, [&] { interruption.Request(); });
+    After(1'000'000, [&] { interruption.Request(); });
     Succeed({"monitor"});
     EXPECT_EQ(tool.Out(), "") << "an end that the user wants is no removal";
 }
@@ -199,7 +192,7 @@ TEST_P(InstrumentCommandsTest, WriteImageWritesTheBytesAsTheyAre) {
 TEST_P(InstrumentCommandsTest, WriteImageTellsHowFarItCame) {
     host.Add("sim");
     WriteFile(folder.Path("image"), std::vector<std::uint8_t>(8192, 5));
-    host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-out 9:stall"));
+    SetFaults("bulk-out 9:stall");
     Fail({"write-image", folder.Path("image")}, ExitCode::InputOutput, "3 of 32 pieces were written");
 }
 
@@ -214,7 +207,7 @@ TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
     EXPECT_EQ(tool.Err(), "");
     Succeed({"identify", "--json"});
     EXPECT_EQ(tool.Json()["name"], "left");
-    EXPECT_NE(tool.Err().find("taking " + Identifier("left")), std::string::npos);
+    EXPECT_THAT(tool.Err(), HasSubstr("taking " + Identifier("left")));
 }
 
 TEST_P(InstrumentCommandsTest, FailuresHaveTheirExitCodesAndNameTheInstrument) {
@@ -233,7 +226,7 @@ TEST_P(InstrumentCommandsTest, FailuresHaveTheirExitCodesAndNameTheInstrument) {
              Case{"control 0:stall", ExitCode::InputOutput},
          }) {
         host.Add("sim");
-        host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse(row.faults));
+        SetFaults(row.faults);
         SCOPED_TRACE(row.faults);
         Fail({"readout"}, row.code, Identifier());
         EXPECT_EQ(tool.Out(), "");
@@ -281,10 +274,10 @@ TEST(CommandLineTest, UsageErrorsGoToStandardError) {
     };
     for (const auto& [arguments, text] : texts) {
         tool.Run(arguments);
-        EXPECT_THAT(tool.Err(), testing::HasSubstr(text));
+        EXPECT_THAT(tool.Err(), HasSubstr(text));
     }
     EXPECT_EQ(tool.Run({"--help"}), ExitCode::Success);
-    EXPECT_NE(tool.Out().find("Exit codes:"), std::string::npos);
+    EXPECT_THAT(tool.Out(), HasSubstr("Exit codes:"));
     EXPECT_EQ(tool.Run({"--version"}), ExitCode::Success);
     EXPECT_EQ(tool.Out(), "ostra 1.0.3\n");
 }

@@ -61,7 +61,7 @@ TEST_P(MemoryCommandsTest, ReadingChangesNothing) {
              {"word", "get"},
          }) {
         // Not even the same bytes once more: the first write would stall.
-        host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-out 0+:stall"));
+        SetFaults("bulk-out 0+:stall");
         Succeed(command);
         ExpectUnchanged();
     }
@@ -119,7 +119,7 @@ TEST_P(MemoryCommandsTest, CheckAnswersWithItsExitCode) {
     damaged[4096] = 7;
     instrument.SetEeprom(damaged);
     Fail({"eeprom", "check"}, ExitCode::BadData);
-    EXPECT_NE(tool.Out().find("error"), std::string::npos);
+    EXPECT_THAT(tool.Out(), HasSubstr("error"));
     Fail({"eeprom", "check", "--json"}, ExitCode::BadData);
     EXPECT_EQ(tool.Json()["sane"], false);
     for (const Arguments& command : std::vector<Arguments>{{"eeprom", "show"},
@@ -128,7 +128,7 @@ TEST_P(MemoryCommandsTest, CheckAnswersWithItsExitCode) {
                                                            {"log", "show"},
                                                            {"log", "reset"}}) {
         Fail(command, ExitCode::BadData, Identifier() + ": the driver cannot use");
-        EXPECT_NE(tool.Err().find("`ostra eeprom check --device sim`"), std::string::npos) << tool.Err();
+        EXPECT_THAT(tool.Err(), HasSubstr("`ostra eeprom check --device sim`"));
     }
     Succeed({"eeprom", "backup", backup});  // whatever it holds
     EXPECT_EQ(ReadFile(backup), damaged);
@@ -177,15 +177,13 @@ TEST_P(MemoryCommandsTest, DryRunsChangeNothingAndLeaveNoFile) {
              {"word", "put", "10200=1"},
              {"ram", "set", "2010=5"},
          }) {
-        const auto parameters =
-            instrument.WithCommands([](const auto& commands) { return commands.parameters; });
+        const auto parameters = ParametersOf(instrument);
         Arguments arguments = command;
         arguments.insert(arguments.end(), {"--dry-run", "--json"});
         Succeed(arguments);
         EXPECT_EQ(tool.Json()["dryRun"], true);
         ExpectUnchanged();
-        EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.parameters; }),
-                  parameters);
+        EXPECT_EQ(ParametersOf(instrument), parameters);
     }
     EXPECT_EQ(folder.Files(), (std::vector<std::string>{"block", "image"}));
 }
@@ -213,10 +211,9 @@ TEST_P(MemoryCommandsTest, AFailedWriteTellsTheWayBack) {
     for (std::uint32_t piece = 0;; ++piece) {
         instrument.SetEeprom(before);
         std::filesystem::remove(backup);
-        host.Bus().SetFaults("sim",
-                             Simulator::FaultPlan::Parse("bulk-out " + std::to_string(piece) + ":stall"));
+        SetFaults("bulk-out " + std::to_string(piece) + ":stall");
         const ExitCode code = tool.Run({"eeprom", "write", image, "--backup", backup, "--force"});
-        host.Bus().SetFaults("sim", {});
+        SetFaults("");
         if (code == ExitCode::Success) {
             break;
         }
@@ -238,9 +235,9 @@ TEST_P(MemoryCommandsTest, AFailedWriteTellsTheWayBack) {
 TEST_P(MemoryCommandsTest, WhatReadsBackDifferentlyIsAFailure) {
     WriteFile(image, Calibrated("5"));
     // Readings 0 to 3 are two of the whole EEPROM before the write, 4 and 5 the one after it.
-    host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-in 5:flip=100"));
+    SetFaults("bulk-in 5:flip=100");
     Fail({"eeprom", "write", image, "--backup", backup}, ExitCode::InputOutput, "reads back differently");
-    EXPECT_NE(tool.Err().find("eeprom restore"), std::string::npos) << tool.Err();
+    EXPECT_THAT(tool.Err(), HasSubstr("eeprom restore"));
 }
 
 TEST_P(MemoryCommandsTest, ABackupThatCannotBeTrustedIsNone) {
@@ -248,8 +245,7 @@ TEST_P(MemoryCommandsTest, ABackupThatCannotBeTrustedIsNone) {
     for (const int reading : {0, 1, 2, 3}) {
         for (const Arguments& command : std::vector<Arguments>{{"eeprom", "write", image, "--backup", backup},
                                                                {"eeprom", "backup", backup}}) {
-            host.Bus().SetFaults(
-                "sim", Simulator::FaultPlan::Parse("bulk-in " + std::to_string(reading) + ":flip=9"));
+            SetFaults("bulk-in " + std::to_string(reading) + ":flip=9");
             Fail(command, ExitCode::InputOutput, "two readings of the EEPROM differ");
             ExpectUnchanged();
             EXPECT_EQ(folder.Files(), std::vector<std::string>{"image"});
@@ -264,12 +260,11 @@ TEST_P(MemoryCommandsTest, CtrlCEndsAWriteBetweenTwoPieces) {
     Cli::Interruption interruption;
     tool.interruption = &interruption;
     // In the middle of the fifth piece.
-    host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-out 12:late=400"));
-    auto& scheduler = Platform::ClockScheduler();
-    scheduler.CallAt(scheduler.Now() + 300'000, [&] { interruption.Request(); });
+    SetFaults("bulk-out 12:late=400");
+    After(300'000, [&] { interruption.Request(); });
     Fail({"eeprom", "write", image, "--backup", backup}, ExitCode::Interrupted);
     EXPECT_NE(tool.Err().find("interrupted; 5 of 13 pieces"), std::string::npos) << tool.Err();
-    EXPECT_NE(tool.Err().find("eeprom restore"), std::string::npos) << tool.Err();
+    EXPECT_THAT(tool.Err(), HasSubstr("eeprom restore"));
     // 5000 lies in the piece from 4864 on.
     EepromImage expected = before;
     std::fill(expected.begin() + 5000, expected.begin() + 4864 + 5 * 256, std::uint8_t{0x77});
@@ -351,7 +346,7 @@ TEST_P(MemoryCommandsTest, DiffNamesValuesAndAreas) {
     Succeed({"eeprom", "diff", image});
     WriteFile(backup, Cli::WithCalibration(before, {{1211, "78"}}).image);
     Fail({"eeprom", "diff", image, backup}, ExitCode::Different);
-    EXPECT_NE(tool.Out().find("calibration  1211  77 -> 78"), std::string::npos) << tool.Out();
+    EXPECT_THAT(tool.Out(), HasSubstr("calibration  1211  77 -> 78"));
     Fail({"eeprom", "diff", backup, "--json"}, ExitCode::Different);
     EXPECT_EQ(tool.Json()["b"], Identifier());
     EXPECT_EQ(tool.Json()["values"],
@@ -382,18 +377,14 @@ TEST_P(RamTest, TimesFollowTheModeThatTheInstrumentIsIn) {
     auto& instrument = host.Add("sim");
     Succeed({"ram", "set", "2009=0.005", "2008=1", "--json"});
     EXPECT_NEAR(tool.Json()["changes"][0]["after"], 0.004998, 1e-7) << "147 units of 34 us";
-    instrument.WithCommands([](const auto& commands) {
-        EXPECT_EQ(commands.mode, 2);
-        EXPECT_EQ(commands.parameters.p1, 147);
-        EXPECT_EQ(commands.parameters.p4 & 1, 1);
-    });
+    EXPECT_EQ(ModeOf(instrument), 2);
+    EXPECT_EQ(ParametersOf(instrument).p1, 147);
+    EXPECT_EQ(ParametersOf(instrument).p4 & 1, 1);
     // A new run of the tool knows the mode's time unit, and leaves what it was not asked to change.
     Succeed({"ram", "set", "2010=200"});
-    instrument.WithCommands([](const auto& commands) {
-        EXPECT_EQ(commands.mode, 2);
-        EXPECT_EQ(commands.parameters.p1, 147);
-        EXPECT_EQ(commands.parameters.p3, 200);
-    });
+    EXPECT_EQ(ModeOf(instrument), 2);
+    EXPECT_EQ(ParametersOf(instrument).p1, 147);
+    EXPECT_EQ(ParametersOf(instrument).p3, 200);
     Succeed({"ram", "show", "--json"});
     EXPECT_NEAR(tool.Json()["ram"]["2009"], 0.004998, 1e-7);
 }
@@ -403,23 +394,18 @@ TEST_P(RamTest, OldFirmwareHasOneMode) {
     settings.firmware = Simulator::OldFirmware;
     auto& instrument = host.Add("sim", settings);
     const auto expectParameters = [&instrument] {
-        instrument.WithCommands([](const auto& commands) {
-            EXPECT_EQ(commands.parameters.p1, 1000);
-            EXPECT_EQ(commands.parameters.p2, 10);
-        });
+        EXPECT_EQ(ParametersOf(instrument).p1, 1000);
+        EXPECT_EQ(ParametersOf(instrument).p2, 10);
     };
     Succeed({"ram", "set", "2009=0.068", "2001=0.0884"});
     expectParameters();
     EXPECT_EQ(tool.Run({"ram", "set", "2009=4.4565"}), ExitCode::BadData) << "its 16 bits would be cut off";
-    EXPECT_NE(tool.Err().find("the longest is 4.45638 s"), std::string::npos) << tool.Err();
+    EXPECT_THAT(tool.Err(), HasSubstr("the longest is 4.45638 s"));
     expectParameters();
 }
 
 TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
     auto& instrument = host.Add("sim");
-    const auto modeOf = [&] {
-        return instrument.WithCommands([](const auto& commands) { return commands.mode; });
-    };
     Succeed({"ram", "set", "2009=0.005"});
     struct Case {
         const char* seconds;
@@ -428,11 +414,11 @@ TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
     for (const Case& row :
          {Case{"10", "Integration time too high"}, Case{"0.0009", "Integration time too low"}}) {
         Fail({"ram", "set", std::string("2009=") + row.seconds}, ExitCode::BadData, row.text);
-        EXPECT_NE(tool.Err().find("mode 3: 0.001 s to 0.65535 s"), std::string::npos) << tool.Err();
-        EXPECT_EQ(modeOf(), 2) << "back in its mode";
+        EXPECT_THAT(tool.Err(), HasSubstr("mode 3: 0.001 s to 0.65535 s"));
+        EXPECT_EQ(ModeOf(instrument), 2) << "back in its mode";
     }
     Fail({"ram", "set", "2009=0.05", "2001=600"}, ExitCode::BadData, "the longest is 579.329 s");
-    EXPECT_EQ(modeOf(), 2) << "back in its mode";
+    EXPECT_EQ(ModeOf(instrument), 2) << "back in its mode";
 }
 
 TEST_P(RamTest, RefusesWhatCannotBeSet) {
@@ -451,7 +437,7 @@ TEST_P(RamTest, TellsWhatElseHasChanged) {
     Succeed({"ram", "set", "9189=300", "2008=1", "--json"});
     EXPECT_EQ(tool.Json()["changes"], nlohmann::json::parse(R"([{"id":9189,"before":-1,"after":300},
         {"id":2008,"before":0,"after":0},{"id":2010,"before":1,"after":300}])"));
-    EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.parameters.p3; }), 300);
+    EXPECT_EQ(ParametersOf(instrument).p3, 300);
 }
 
 }  // namespace

@@ -6,6 +6,7 @@ namespace Varnholt::Tests {
 namespace {
 
 using Cli::ExitCode;
+using testing::HasSubstr;
 
 constexpr std::size_t RecordSize = 256;
 
@@ -64,7 +65,7 @@ TEST_P(ScanTest, CsvHasOneRecordALineAndTheSameNumbers) {
         first += (i > 0 ? "," : "") + std::to_string(value > 0xF800 ? value - 0x10000 : value);
     }
     EXPECT_EQ(tool.Lines()[0], first);
-    EXPECT_NE(tool.Err().find("8 records of 256 bytes"), std::string::npos) << tool.Err();
+    EXPECT_THAT(tool.Err(), HasSubstr("8 records of 256 bytes"));
 }
 
 TEST_P(ScanTest, OtherRecordSizes) {
@@ -90,17 +91,17 @@ TEST_P(ScanTest, ProgressOnATerminalOnly) {
     tool.errFacts.isTerminal = true;
     host.Add("sim", Streaming(1'000'000));
     Succeed({"scan", "--total", "512000", "--output", folder.Path("csv")});
-    EXPECT_NE(tool.Err().find("512.0 kB of 512.0 kB"), std::string::npos) << tool.Err();
+    EXPECT_THAT(tool.Err(), HasSubstr("512.0 kB of 512.0 kB"));
 }
 
 TEST_P(ScanTest, AFailedScanLeavesTheFileThatWasThere) {
     host.Add("sim", Streaming(10'000'000));
     WriteFile(folder.Path("csv"), {1});
-    host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-in 5:stall"));
+    SetFaults("bulk-in 5:stall");
     Fail({"scan", "--total", "1000000", "--output", folder.Path("csv")}, ExitCode::InputOutput);
     EXPECT_EQ(ReadFile(folder.Path("csv")), std::vector<std::uint8_t>{1});
     EXPECT_EQ(folder.Files().size(), 1u);
-    host.Bus().SetFaults("sim", {});
+    SetFaults("");
     Succeed({"scan", "--total", "10240"});
 }
 
@@ -113,7 +114,7 @@ TEST_P(ScanTest, AnInstrumentThatStopsTooEarlyFailsAFixedScan) {
 
 TEST_P(ScanTest, AnInstrumentThatFallsSilentIsATimeout) {
     host.Add("sim", Streaming(10'000'000));
-    host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse("bulk-in 1+:silent"));
+    SetFaults("bulk-in 1+:silent");
     for (const std::vector<std::string>& kind :
          {std::vector<std::string>{"scan", "--timeout", "2"},
           std::vector<std::string>{"scan", "--timeout", "2", "--total", "1000000"}}) {
@@ -125,8 +126,7 @@ TEST_P(ScanTest, AnInstrumentThatFallsSilentIsATimeout) {
 
 TEST_P(ScanTest, AnUnpluggedInstrumentIsSaidToBe) {
     host.Add("sim", Streaming(100'000'000, 1'000'000));
-    auto& scheduler = Platform::ClockScheduler();
-    scheduler.CallAt(scheduler.Now() + 5'000'000, [&] { host.Bus().Unplug("sim"); });
+    After(5'000'000, [&] { host.Bus().Unplug("sim"); });
     Fail({"scan"}, ExitCode::NoInstrument, Identifier());
 }
 
@@ -139,13 +139,12 @@ TEST_P(ScanTest, CtrlCEndsAScanAndLeavesTheInstrumentUsable) {
         tool.interruption = &interruption;
         const auto resets = instrument.WithCommands([](const auto& commands) { return commands.resets; });
         const Stopwatch watch(clock);
-        auto& scheduler = Platform::ClockScheduler();
-        scheduler.CallAt(scheduler.Now() + 10'000'000, [&] { interruption.Request(); });
+        After(10'000'000, [&] { interruption.Request(); });
         Arguments arguments = kind;
         arguments.insert(arguments.end(), {"--output", folder.Path("csv")});
         EXPECT_EQ(tool.Run(arguments), ExitCode::Interrupted) << tool.Err();
         watch.ExpectBetween(10'000, 12'500);
-        EXPECT_NE(tool.Err().find("scan interrupted after "), std::string::npos) << tool.Err();
+        EXPECT_THAT(tool.Err(), HasSubstr("scan interrupted after "));
         EXPECT_EQ(ReadFile(folder.Path("csv")), std::vector<std::uint8_t>{1});
         EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), resets + 2);
         EXPECT_EQ(instrument.PendingTransfers(), 0u);
@@ -162,11 +161,10 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
     for (std::uint64_t after = 0; after < 4'000; after += 100) {
         Cli::Interruption interruption;
         tool.interruption = &interruption;
-        auto& scheduler = Platform::ClockScheduler();
-        const auto event = scheduler.CallAt(scheduler.Now() + after * 1000, [&] { interruption.Request(); });
+        const auto event = After(after * 1000, [&] { interruption.Request(); });
         const Stopwatch watch(clock);
         const ExitCode code = tool.Run({"scan", "--output", folder.Path("csv")});
-        scheduler.Forget(event);
+        Platform::ClockScheduler().Forget(event);
         constexpr std::uint32_t ending = 50;
         watch.ExpectAtMost(code == ExitCode::Interrupted ? static_cast<std::uint32_t>(after) + ending
                                                          : 8'000);

@@ -3,6 +3,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <nlohmann/json.hpp>
 #include <sstream>
 #include <string>
@@ -59,6 +60,20 @@ class ToolTest : public testing::TestWithParam<Transport> {
         EXPECT_THAT(tool.Err(), testing::HasSubstr(text)) << testing::PrintToString(arguments);
     }
     std::string Identifier(const std::string& name = "sim") const { return host.Identifier(name); }
+    void SetFaults(const std::string& plan) {
+        host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse(plan));
+    }
+    /// Has something happen, so many microseconds from now.
+    static Platform::EventScheduler::EventId After(std::uint64_t microseconds, std::function<void()> event) {
+        auto& scheduler = Platform::ClockScheduler();
+        return scheduler.CallAt(scheduler.Now() + microseconds, std::move(event));
+    }
+    static Simulator::MeasureParameters ParametersOf(Simulator::SimulatedInstrument& instrument) {
+        return instrument.WithCommands([](const auto& commands) { return commands.parameters; });
+    }
+    static int ModeOf(Simulator::SimulatedInstrument& instrument) {
+        return instrument.WithCommands([](const auto& commands) { return commands.mode; });
+    }
 
     TestClock clock{TestTime::Virtual};
     SimulatedHost host{GetParam()};
