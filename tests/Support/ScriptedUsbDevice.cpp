@@ -43,14 +43,18 @@ void ScriptedUsbDevice::LeaveToTest(std::uint8_t endpoint) {
     leftToTest.insert(endpoint);
 }
 
+ScriptedUsbDevice::Running* ScriptedUsbDevice::OldestWaiting(std::uint8_t endpoint) {
+    const auto oldest = std::ranges::find_if(running, [endpoint](const Running& candidate) {
+        return candidate.transfer->endpoint == endpoint && !candidate.ready;
+    });
+    return oldest == running.end() ? nullptr : &*oldest;
+}
+
 void ScriptedUsbDevice::Send(std::uint8_t endpoint, Bytes data) {
     {
         const std::lock_guard guard(lock);
-        const auto oldest =
-            std::find_if(running.begin(), running.end(), [endpoint](const Running& candidate) {
-                return candidate.transfer->endpoint == endpoint && !candidate.ready;
-            });
-        if (oldest == running.end()) {
+        Running* const oldest = OldestWaiting(endpoint);
+        if (!oldest) {
             unsent.emplace_back(endpoint, std::move(data));
             return;
         }
@@ -63,11 +67,8 @@ void ScriptedUsbDevice::Send(std::uint8_t endpoint, Bytes data) {
 bool ScriptedUsbDevice::CompleteNext(std::uint8_t endpoint) {
     {
         const std::lock_guard guard(lock);
-        const auto oldest =
-            std::find_if(running.begin(), running.end(), [endpoint](const Running& candidate) {
-                return candidate.transfer->endpoint == endpoint && !candidate.ready;
-            });
-        if (oldest == running.end()) {
+        Running* const oldest = OldestWaiting(endpoint);
+        if (!oldest) {
             return false;
         }
         oldest->ready = true;
@@ -121,9 +122,8 @@ std::uint32_t ScriptedUsbDevice::TimesClaimed() const {
 
 std::size_t ScriptedUsbDevice::Pending(std::uint8_t endpoint) const {
     const std::lock_guard guard(lock);
-    return static_cast<std::size_t>(std::count_if(
-        running.begin(), running.end(),
-        [endpoint](const Running& candidate) { return candidate.transfer->endpoint == endpoint; }));
+    return static_cast<std::size_t>(std::ranges::count(
+        running, endpoint, [](const Running& candidate) { return candidate.transfer->endpoint; }));
 }
 
 std::vector<Platform::Usb::EndpointInfo> ScriptedUsbDevice::Endpoints() {
@@ -161,8 +161,7 @@ ErrorCode ScriptedUsbDevice::Submit(Transfer& transfer) {
         Exchange::When when = Exchange::When::AtOnce;
         if (leftToTest.contains(endpoint)) {
             const auto waiting =
-                std::find_if(unsent.begin(), unsent.end(),
-                             [endpoint](const auto& candidate) { return candidate.first == endpoint; });
+                std::ranges::find(unsent, endpoint, [](const auto& sent) { return sent.first; });
             when = Exchange::When::OnDemand;
             if (waiting != unsent.end()) {
                 submitted.row = BulkIn(transfer.length, std::move(waiting->second), endpoint);
@@ -210,10 +209,9 @@ void ScriptedUsbDevice::Cancel(Transfer& transfer) {
     bool later = false;
     {
         const std::lock_guard guard(lock);
-        const auto found =
-            std::find_if(running.begin(), running.end(), [&transfer](const Running& candidate) {
-                return candidate.transfer == &transfer && !candidate.cancelled;
-            });
+        const auto found = std::ranges::find_if(running, [&transfer](const Running& candidate) {
+            return candidate.transfer == &transfer && !candidate.cancelled;
+        });
         if (found == running.end()) {
             return;
         }
@@ -289,10 +287,9 @@ void ScriptedUsbDevice::CompleteReady(std::uint8_t endpoint) {
         Running ended{};
         {
             const std::lock_guard guard(lock);
-            const auto oldest =
-                std::find_if(running.begin(), running.end(), [endpoint](const Running& candidate) {
-                    return candidate.transfer->endpoint == endpoint && !candidate.cancelled;
-                });
+            const auto oldest = std::ranges::find_if(running, [endpoint](const Running& candidate) {
+                return candidate.transfer->endpoint == endpoint && !candidate.cancelled;
+            });
             if (oldest == running.end() || !oldest->ready) {
                 return;
             }
@@ -313,9 +310,7 @@ void ScriptedUsbDevice::CompleteLater(std::uint64_t number, std::uint64_t delay)
         std::uint8_t endpoint = 0;
         {
             const std::lock_guard guard(lock);
-            const auto found =
-                std::find_if(running.begin(), running.end(),
-                             [number](const Running& candidate) { return candidate.number == number; });
+            const auto found = std::ranges::find(running, number, &Running::number);
             if (found == running.end()) {
                 return;
             }
@@ -352,12 +347,15 @@ void ScriptedBus::Plug(const std::string& name, std::shared_ptr<ScriptedUsbDevic
     devices.emplace_back(name, std::move(device));
 }
 
+ScriptedBus::Devices::iterator ScriptedBus::FindDevice(const std::string& name) {
+    return std::ranges::find(devices, name, [](const auto& device) { return device.first; });
+}
+
 void ScriptedBus::Unplug(const std::string& name) {
     std::shared_ptr<ScriptedUsbDevice> unplugged;
     {
         const std::lock_guard guard(lock);
-        const auto found = std::find_if(devices.begin(), devices.end(),
-                                        [&name](const auto& device) { return device.first == name; });
+        const auto found = FindDevice(name);
         if (found == devices.end()) {
             return;
         }
@@ -387,8 +385,7 @@ std::shared_ptr<Platform::Usb::UsbDevice> ScriptedBus::Open(const std::string& n
     if (error != Errors::Success) {
         return nullptr;
     }
-    const auto found = std::find_if(devices.begin(), devices.end(),
-                                    [&name](const auto& device) { return device.first == name; });
+    const auto found = FindDevice(name);
     if (found == devices.end()) {
         error = Errors::FileNotFound;
         return nullptr;

@@ -74,6 +74,7 @@ class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
         bool cancelled;  ///< completes out of order
     };
 
+    Running* OldestWaiting(std::uint8_t endpoint);
     bool Matches(const Exchange& row, const Platform::Usb::Transfer& transfer) const;
     void Mismatch(const std::string& actual);
     void CompleteReady(std::uint8_t endpoint);
@@ -114,8 +115,11 @@ class ScriptedBus final : public Platform::Usb::UsbBus {
                                                    Platform::ErrorCode& error) override;
 
   private:
+    using Devices = std::vector<std::pair<std::string, std::shared_ptr<ScriptedUsbDevice>>>;
+    Devices::iterator FindDevice(const std::string& name);
+
     std::mutex lock;
-    std::vector<std::pair<std::string, std::shared_ptr<ScriptedUsbDevice>>> devices;
+    Devices devices;
     Platform::ErrorCode openAnswer = Platform::Errors::Success;
 };
 

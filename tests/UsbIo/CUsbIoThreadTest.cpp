@@ -227,6 +227,27 @@ TEST_F(CUsbIoThreadTest, WritesUntilFinished) {
     }
 }
 
+TEST(CUsbIoBufferPool, HandsOutTheBufferPutBackLast) {
+    CUsbIoBufferPool pool;
+    EXPECT_FALSE(pool.Allocate(0xFFFFFFFF, 0xFFFFFFFF)) << "more than there can be";
+    EXPECT_EQ(pool.Get(), nullptr);
+    ASSERT_TRUE(pool.Allocate(16, 2));
+    EXPECT_FALSE(pool.Allocate(16, 2)) << "is in use";
+    CUsbIoBuffer* const first = pool.Get();
+    CUsbIoBuffer* const second = pool.Get();
+    ASSERT_TRUE(first && second);
+    EXPECT_EQ(pool.Get(), nullptr);
+    EXPECT_EQ(static_cast<std::uint8_t*>(first->Buffer), static_cast<std::uint8_t*>(second->Buffer) + 16)
+        << "one block of memory; the buffer behind all others comes first";
+    pool.Put(first);
+    pool.Put(second);
+    EXPECT_EQ(pool.CurrentCount(), 2U);
+    EXPECT_EQ(pool.Get(), second);
+    pool.Free();
+    EXPECT_EQ(pool.CurrentCount(), 0U);
+    EXPECT_TRUE(pool.Allocate(1, 1));
+}
+
 TEST(CUsbIoThreadRace, AThreadThatEndedByItselfCanBeStartedAgain) {
     for (std::uint64_t seed = 1; seed <= Tests::TestClock::SeedsToTry; ++seed) {
         const Tests::TestClock clock(Tests::TestTime::RealForThreadSanitizer, seed);
