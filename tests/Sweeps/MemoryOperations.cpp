@@ -90,13 +90,12 @@ void CheckEeprom(const Bytes& before, const std::vector<Area>& written, const By
     }
 }
 
-std::function<Outcome()> OnModel(std::function<void(PellandoEEPROM&)> work) {
+/// Ends with what was thrown, or with why the log was lost.
+std::function<Outcome()> Caught(std::function<void(Outcome& lost)> work) {
     return [work = std::move(work)]() -> Outcome {
         Outcome lost;
         try {
-            PellandoEEPROM eeprom(Commands(new PellandoFunctionality(nullptr, 0)));
-            eeprom.ReportLostLog([&lost](const std::string& reason) { lost = reason; });
-            work(eeprom);
+            work(lost);
         } catch (const Utilities::Exceptions::TraceableException& exception) {
             return std::string(exception.what());
         }
@@ -104,7 +103,7 @@ std::function<Outcome()> OnModel(std::function<void(PellandoEEPROM&)> work) {
     };
 }
 
-void StoreParameters() {
+void StoreParameters(Outcome&) {
     PellandoRAM ram(Commands(new PellandoFunctionality(nullptr, 0)));
     Properties set("PhysicalConditions");
     ram.Load(set);
@@ -126,7 +125,12 @@ Operation OfModel(const char* name, std::function<void(PellandoEEPROM&)> work,
                   const std::vector<Area>& written = {}) {
     std::vector<Area> all = written;
     all.insert(all.end(), {{Map::MainLog, Map::LogSize}, {Map::LogCopy, Map::LogSize}});
-    return Checked(name, OnModel(std::move(work)), std::move(all));
+    const auto onModel = [work = std::move(work)](Outcome& lost) {
+        PellandoEEPROM eeprom(Commands(new PellandoFunctionality(nullptr, 0)));
+        eeprom.ReportLostLog([&lost](const std::string& reason) { lost = reason; });
+        work(eeprom);
+    };
+    return Checked(name, Caught(onModel), std::move(all));
 }
 
 }  // namespace
@@ -138,6 +142,7 @@ std::vector<Operation> MemoryOperations() {
                 [](PellandoEEPROM& eeprom) {
                     Properties set;
                     set.SetProperty(10002, Property(std::int32_t{6}));
+                    set.SetProperty(10021, Property(std::int32_t{7}));  // in another piece than the checksum
                     set.SetProperty(20001, Property(std::int32_t{1}));
                     eeprom.Store(set);
                 }),
@@ -157,16 +162,7 @@ std::vector<Operation> MemoryOperations() {
                 {{Map::BinaryFirst, Map::BinaryFirstSize},
                  {Map::BinarySecond, Map::BinarySecondSize},
                  {Map::RawWords + 3 * Map::RawWordSize, Map::RawWordSize}}),
-        Checked("RamStore",
-                []() -> Outcome {
-                    try {
-                        StoreParameters();
-                        return std::nullopt;
-                    } catch (const Utilities::Exceptions::TraceableException& exception) {
-                        return std::string(exception.what());
-                    }
-                },
-                {}),
+        Checked("RamStore", Caught(&StoreParameters), {}),
     };
 }
 
