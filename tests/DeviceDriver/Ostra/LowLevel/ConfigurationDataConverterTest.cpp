@@ -17,24 +17,15 @@ using testing::StrEq;
 using testing::ThrowsMessage;
 using Ids = std::set<int>;
 
-TEST(ConfigurationDataConverter, EveryIdentifierBelongsWhereItShould) {
-    struct Category {
+/// Calibration, log, misc and measure parameters show in what the memory model loads.
+TEST(ConfigurationDataConverter, OtherCategories) {
+    using Converter = ConfigurationDataConverter;
+    const struct {
         const char* name;
         bool (*contains)(std::uint16_t);
         Ids ids;
-    };
-    using Converter = ConfigurationDataConverter;
-    const Category categories[] = {
-        {"calibration",
-         &Converter::IsCalibrationParameter,
-         {1000, 1001, 1002, 1003, 1004, 1100, 1101, 1102, 1204, 1205, 1207, 1208, 1211, 1212,
-          1213, 1221, 1222, 3001, 3002, 3007, 3008, 3009, 3010, 3011, 3012, 3013, 3014, 4000}},
-        {"log",
-         &Converter::IsLogParameter,
-         {10000, 10001, 10002, 10003, 10004, 10005, 10010, 10011, 10012, 10013, 10020, 10021}},
-        {"misc", &Converter::IsMiscParameter, {2004, 2006, 2012, 2013, 2016, 2017, 2020}},
+    } categories[] = {
         {"special", &Converter::IsSpecialParameter, {3009, 3010}},
-        {"measure", &Converter::IsMeasureParameter, {2000, 2001, 2002, 2003, 2008, 2009, 2010, 2021}},
         {"reset", &Converter::IsResetParameter, {2007}},
         {"CPLD", &Converter::IsCPLDParameter, {20000}},
         {"firmware download", &Converter::IsFirmwareDownloadParameter, {20003}},
@@ -42,7 +33,7 @@ TEST(ConfigurationDataConverter, EveryIdentifierBelongsWhereItShould) {
          &Converter::IsModeDependent,
          {2000, 2001, 2002, 2003, 2008, 2009, 2010, 2011, 2014, 2015, 2021}},
     };
-    for (const Category& category : categories) {
+    for (const auto& category : categories) {
         for (int id = 0; id <= 0xFFFF; ++id) {
             ASSERT_EQ(category.contains(static_cast<std::uint16_t>(id)), category.ids.contains(id))
                 << category.name << " " << id;
@@ -85,6 +76,15 @@ TEST(ConfigurationDataConverter, EveryIdentifierHasItsDefaultOrNone) {
                 ThrowsMessage<DataException>(StrEq("invalid property id " + std::to_string(id))));
         }
     }
+}
+
+TEST(ConfigurationDataConverter, ConvertsBigEndian) {
+    Property entry(0.0F);
+    ConfigurationDataConverter::ByteArrayToConfigurationDataEntry({0xBF, 0x80, 0, 0}, entry);
+    EXPECT_EQ(entry.AsFloat(), -1.0F);
+    std::vector<std::uint8_t> bytes{1, 2, 3};
+    ConfigurationDataConverter::ConfigurationDataEntryToByteArray(Property(std::int32_t{-2}), bytes);
+    EXPECT_EQ(bytes, (std::vector<std::uint8_t>{0xFF, 0xFF, 0xFF, 0xFE}));
 }
 
 }  // namespace

@@ -22,34 +22,25 @@ class NativeCommands : public NativeTest {
 };
 
 TEST_F(NativeCommands, SendWhatEarlierCommandsLeft) {
-    const Bytes2 zero{};
-    const auto send = [&](const std::function<void()>& command) {
-        driver.TakeTransfers();
-        command();
-        const Lines lines = driver.TakeTransfers();
-        return lines.empty() ? std::string() : lines.front();
-    };
-    const auto setParameters = [&] { instrument.SetMeasureParameters(zero, zero, zero, 0); };
-    EXPECT_EQ(send(setParameters), "control 22000D 00 02 00 00 C1 00 00 00 00 00 / 00 00 00 00 00 00 00 00");
-    driver.Script(0, {.data = Counting(8, 0xA1)});
-    Bytes2 ignored{};
+    Bytes2 value{0x77, 0x1F};
     std::uint8_t p4 = 0, p5 = 0;
-    instrument.GetMeasureParameters(ignored, ignored, ignored, p4, p5);
-    EXPECT_EQ(send(setParameters), "control 22000D 00 02 00 00 C1 00 00 00 00 00 / 00 00 00 00 00 00 00 A8");
-
-    EXPECT_EQ(send([&] {
-                  instrument.Reset({0x77, 0x1F});
-              }),
-              "control 22000D 00 02 00 00 CA 00 00 00 00 00 / 1F");
+    driver.Script(0, {.data = Counting(8, 0xA1)});
+    instrument.GetMeasureParameters(value, value, value, p4, p5);
+    instrument.SetMeasureParameters({}, {}, {}, 0);
+    instrument.Reset({0x77, 0x1F});
     driver.Script(0, {.data = {}});  // nothing answered: the left-over bytes come back
-    Bytes2 cpld{};
-    instrument.ReadCPLD(cpld);
-    EXPECT_THAT(cpld, ElementsAre(0x1F, 0x1F));
-
+    instrument.ReadCPLD(value);
+    EXPECT_THAT(value, ElementsAre(0x1F, 0x1F));
     const std::uint8_t image = 0x99;
     instrument.DownloadRAMFirmware(0x1234, &image, 1);
-    EXPECT_EQ(send([&] { instrument.SetMeasureMode(1); }),
-              "control 22000D 00 02 00 00 CF 00 34 12 00 00 / 01");
+    instrument.SetMeasureMode(1);
+    EXPECT_THAT(driver.TakeTransfers(),
+                ElementsAre("control 22000D 01 02 00 00 C2 00 00 00 00 00 / [8]",
+                            "control 22000D 00 02 00 00 C1 00 00 00 00 00 / 00 00 00 00 00 00 00 A8",
+                            "control 22000D 00 02 00 00 CA 00 00 00 00 00 / 1F",
+                            "control 22000D 01 02 00 00 C8 00 00 00 00 00 / [2]",
+                            "control 22000D 00 02 00 00 A0 00 34 12 00 00 / 99",
+                            "control 22000D 00 02 00 00 CF 00 34 12 00 00 / 01"));
 }
 
 TEST_F(NativeCommands, GiveTheirTransfersTheirTime) {

@@ -20,8 +20,8 @@ using testing::SizeIs;
 using Varnholt::Utilities::Multithreading::Mutex;
 using Varnholt::Utilities::Multithreading::ScopedLock;
 
-constexpr std::uint32_t Button = 20011;
-constexpr std::uint32_t Gone = 20010;
+using DeviceDriver::Generic::MessageButtonData;
+using DeviceDriver::Generic::MessageDeviceGone;
 constexpr std::uint32_t InterruptPipe = 3;
 const Answer ButtonData{.data = {1}};
 const std::string Path = "native/1";
@@ -59,10 +59,12 @@ TEST_F(NativeDevice, SaysNothingOfAButtonThatWasUsed) {
     auto device = Open();
     driver.Complete(InterruptPipe, ButtonData);
     WaitUntil([&] { return !listener.Codes().empty() && IsListening(); });
+    driver.Script(1, {.data = {7}});
+    EXPECT_NO_THROW(ReadOneByte(*device)) << "only the end of the instrument closes its pipes";
     driver.TakeTranscript();
     device.reset();
     EXPECT_THAT(driver.TakeTransfers(), ElementsAre("cancel 3"));
-    EXPECT_THAT(listener.Codes(), ElementsAre(Button));
+    EXPECT_THAT(listener.Codes(), ElementsAre(MessageButtonData));
 }
 
 TEST_F(NativeDevice, ClosesWhateverTheUntouchedControlsMeet) {
@@ -81,29 +83,22 @@ TEST_F(NativeDevice, ClosesWhateverTheUntouchedControlsMeet) {
 }
 
 TEST_F(NativeDevice, ThatCannotBeOpenedLeavesNothingBehind) {
-    const std::string noPipe = "could not open pipe:" + ErrorSuffix(Errors::FileNotFound);
-    const struct {
-        std::string pipe;
-        std::string text;
-    } cases[] = {{"", noPipe},
-                 {"\\PIPE01", noPipe},
-                 {"\\PIPE02", noPipe},
-                 {"\\PIPE03", "interrupt listener thread had timeout"}};
-    for (const auto& row : cases) {
-        ScriptedDriver other;
-        const ScopedDeviceFiles inForce(other);
-        other.RefuseOpen(Path + row.pipe, Errors::FileNotFound);
-        ExpectThrow<IOException>(row.text, [] { PellandoUSBDevice device(nullptr, Path); });
-        EXPECT_EQ(other.OpenFiles(), 0u);
-        EXPECT_THAT(other.TakeTransfers(), IsEmpty());
-    }
+    const auto expectFailure = [&](const std::string& text) {
+        ExpectThrow<IOException>(text, [] { PellandoUSBDevice device(nullptr, Path); });
+        EXPECT_EQ(driver.OpenFiles(), 0u);
+        EXPECT_THAT(driver.TakeTransfers(), IsEmpty());
+    };
     InstallCallFilter([](std::string_view call) {
         return call == "StartThread" ? Errors::NoSystemResources : Errors::Success;
     });
-    ExpectThrow<IOException>("could not create interrupt listener thread",
-                             [] { PellandoUSBDevice device(nullptr, Path); });
+    expectFailure("could not create interrupt listener thread");
     InstallCallFilter({});
-    EXPECT_EQ(driver.OpenFiles(), 0u);
+    driver.RefuseOpen(Path + "\\PIPE03", Errors::FileNotFound);
+    expectFailure("interrupt listener thread had timeout");
+    for (const char* pipe : {"\\PIPE02", "\\PIPE01", ""}) {
+        driver.RefuseOpen(Path + pipe, Errors::FileNotFound);
+        expectFailure("could not open pipe:" + ErrorSuffix(Errors::FileNotFound));
+    }
 }
 
 TEST_F(NativeDevice, ClosesItsPipesWhenTheInstrumentIsGone) {
@@ -111,7 +106,7 @@ TEST_F(NativeDevice, ClosesItsPipesWhenTheInstrumentIsGone) {
     driver.TakeTranscript();
     driver.Complete(InterruptPipe, {.code = Errors::DeviceNotConnected});
     WaitUntil([&] { return driver.OpenFiles() == 0; });
-    EXPECT_THAT(listener.Codes(), ElementsAre(Gone));
+    EXPECT_THAT(listener.Codes(), ElementsAre(MessageDeviceGone));
     EXPECT_THAT(driver.TakeTranscript(), ElementsAre("close native/1\\PIPE02", "close native/1\\PIPE01",
                                                      "close native/1", "close native/1\\PIPE03"));
     const std::string suffix = ErrorSuffix(Errors::InvalidHandle);
@@ -131,7 +126,7 @@ TEST_F(NativeDevice, KeepsItsPipesOpenWithoutAListener) {
         if (isRemoved) {
             device.RemoveListener(nullptr);  // whichever it is
         }
-        device.MessageFromDevice(Gone, 0);
+        device.MessageFromDevice(MessageDeviceGone, 0);
         driver.Script(1, {.data = {7}});
         EXPECT_NO_THROW(ReadOneByte(device));
     }
@@ -149,7 +144,7 @@ TEST_F(NativeDevice, TakesTheDeviceLockForEveryTransfer) {
         [&] { device->WriteData(&byte, 1, 0); },
         [&] { device->ReadDataStrip(records, 1, 0); },
         [&] { device->ReadDataCountedStrip(records, 1, 0, 1); },
-        [&] { device->MessageFromDevice(Button, 0); },
+        [&] { device->MessageFromDevice(MessageButtonData, 0); },
         [&] { device->RemoveListener(&listener); },
     };
     for (const auto& operation : operations) {
@@ -211,7 +206,7 @@ TEST_F(NativeDevice, RemovesAListenerOnlyAfterTheMessageUnderWay) {
     WaitUntil([&] { return isInside.load(); });
     device->RemoveListener(&listener);
     EXPECT_FALSE(isInside);
-    EXPECT_THAT(listener.Codes(), ElementsAre(Button));
+    EXPECT_THAT(listener.Codes(), ElementsAre(MessageButtonData));
 }
 
 TEST_F(NativeDevice, RemovesAListenerFromInsideItsMessage) {
@@ -221,13 +216,13 @@ TEST_F(NativeDevice, RemovesAListenerFromInsideItsMessage) {
         WaitUntil([&] { return driver.Complete(InterruptPipe, ButtonData); });
     }
     WaitUntil([&] { return IsListening(); });
-    EXPECT_THAT(listener.Codes(), ElementsAre(Button));
+    EXPECT_THAT(listener.Codes(), ElementsAre(MessageButtonData));
     device.reset();
     EXPECT_EQ(driver.OpenFiles(), 0u);
 }
 
 TEST_F(NativeDevice, MayBeUsedAndClosedFromInsideAMessage) {
-    for (const std::uint32_t code : {Button, Gone}) {
+    for (const std::uint32_t code : {MessageButtonData, MessageDeviceGone}) {
         auto device = Open();
         std::atomic<bool> hasReturned = false;
         listener.onMessage = [&](std::uint32_t received) {
@@ -239,11 +234,11 @@ TEST_F(NativeDevice, MayBeUsedAndClosedFromInsideAMessage) {
             watch.ExpectAtMost(2u);
             hasReturned = true;
         };
-        driver.Complete(InterruptPipe, code == Button ? ButtonData : Answer{});
+        driver.Complete(InterruptPipe, code == MessageButtonData ? ButtonData : Answer{});
         WaitUntil([&] { return hasReturned.load() && driver.OpenFiles() == 0; });
         EXPECT_EQ(device, nullptr);
     }
-    EXPECT_THAT(listener.Codes(), ElementsAre(Button, Gone));
+    EXPECT_THAT(listener.Codes(), ElementsAre(MessageButtonData, MessageDeviceGone));
 }
 
 /// Closing is bounded even if somebody holds the device lock and the listener's thread waits for it; that

@@ -118,9 +118,6 @@ TEST_F(UsbIoOpening, EachStepOfTheConfigurationCanFail) {
                       0);
         EXPECT_EQ(driver.OpenFiles(), 0U) << row.operation;
     }
-}
-
-TEST_F(UsbIoOpening, FailsWithoutTheListenersThread) {
     Platform::InstallCallFilter([](std::string_view call) {
         return call == "StartThread" ? Platform::Errors::NoSystemResources : 0;
     });
