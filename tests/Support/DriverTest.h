@@ -6,7 +6,6 @@
 #include <functional>
 #include <mutex>
 #include <string>
-#include <typeinfo>
 #include <utility>
 #include <vector>
 
@@ -15,6 +14,7 @@
 #include "Platform/EventScheduler.h"
 #include "Platform/Threads.h"
 #include "Platform/WaitableObjects.h"
+#include "Support/ExpectThrow.h"
 #include "Support/ScriptedDriver.h"
 #include "Support/TestClock.h"
 
@@ -47,18 +47,6 @@ void WaitUntil(Condition condition) {
             return;
         }
         Platform::SleepMilliseconds(1);
-    }
-}
-
-/// Exactly this class, with this text.
-template <class Expected>
-void ExpectThrow(const std::string& text, const std::function<void()>& operation) {
-    try {
-        operation();
-        ADD_FAILURE() << "nothing thrown, expected: " << text;
-    } catch (const std::exception& exception) {
-        EXPECT_EQ(typeid(exception), typeid(Expected));
-        EXPECT_EQ(exception.what(), text);
     }
 }
 

@@ -1,4 +1,3 @@
-#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <atomic>
@@ -8,6 +7,7 @@
 #include <vector>
 
 #include "Platform/CallFilter.h"
+#include "Support/ExpectThrow.h"
 #include "Utilities/Exceptions/Exceptions.h"
 #include "Utilities/Multithreading/Condition.h"
 #include "Utilities/Multithreading/ScopedLock.h"
@@ -17,8 +17,7 @@ namespace {
 
 using namespace std::chrono_literals;
 using Exceptions::ResourceException;
-using testing::StrEq;
-using testing::ThrowsMessage;
+using Tests::ExpectThrow;
 
 constexpr auto ALittle = 30ms;
 
@@ -135,18 +134,17 @@ TEST_F(ConditionTest, NeedsAMutexWithAName) {
     Mutex nameless("");
     Condition refused(nameless);
     const ScopedLock lock(nameless);
-    EXPECT_THAT(
-        [&] { refused.Wait(0); },
-        ThrowsMessage<ResourceException>(StrEq("Condition::Wait() invalid Mutex! (must be a real mutex)")));
+    ExpectThrow<ResourceException>("Condition::Wait() invalid Mutex! (must be a real mutex)",
+                                   [&] { refused.Wait(0); });
     refused.broadcast();  // would wait for ever for a waiter that is still counted
 }
 
 TEST_F(ConditionTest, CannotBeMadeWithoutItsObjects) {
     for (const char* call : {"MakeSemaphore", "MakeAutoResetEvent"}) {
         MakeFail(call);
-        EXPECT_THAT([&] { const Condition refused(mutex); },
-                    ThrowsMessage<ResourceException>(StrEq("ConditionImpl::ConditionImpl() can't create!")))
-            << call;
+        SCOPED_TRACE(call);
+        ExpectThrow<ResourceException>("ConditionImpl::ConditionImpl() can't create!",
+                                       [&] { const Condition refused(mutex); });
     }
 }
 
@@ -163,8 +161,7 @@ TEST_F(ConditionTest, FailedReleaseUnlocksTheMutexAndKeepsNothingLocked) {
         SCOPED_TRACE(row.name);
         mutex.Lock();
         MakeFail("ReleaseSemaphore");
-        EXPECT_THAT([&] { (condition.*row.operation)(); },
-                    ThrowsMessage<ResourceException>(StrEq(row.message)));
+        ExpectThrow<ResourceException>(row.message, [&] { (condition.*row.operation)(); });
         Platform::InstallCallFilter({});
         std::thread([&] {
             EXPECT_TRUE(mutex.TryLock(1000)) << "must have been unlocked";
@@ -184,8 +181,7 @@ TEST_F(ConditionTest, BroadcastReportsAnEventItCannotWaitFor) {
     StartWaiters(2);
     mutex.Lock();
     MakeFail("Wait");
-    EXPECT_THAT([&] { condition.broadcast(); },
-                ThrowsMessage<ResourceException>(StrEq("Condition::broadcast() invalid event!")));
+    ExpectThrow<ResourceException>("Condition::broadcast() invalid event!", [&] { condition.broadcast(); });
     Platform::InstallCallFilter({});
     Await([this] { return woken == 2; });  // which needs the mutex that the failure has unlocked
 }

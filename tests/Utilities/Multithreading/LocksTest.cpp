@@ -9,6 +9,7 @@
 #include <typeinfo>
 
 #include "Platform/CallFilter.h"
+#include "Support/ExpectThrow.h"
 #include "Utilities/Exceptions/Exceptions.h"
 #include "Utilities/Multithreading/Mutex.h"
 #include "Utilities/Multithreading/ScopedLock.h"
@@ -19,8 +20,7 @@ namespace {
 using namespace std::chrono_literals;
 using Exceptions::InvalidArgumentException;
 using testing::StartsWith;
-using testing::StrEq;
-using testing::ThrowsMessage;
+using Tests::ExpectThrow;
 
 constexpr auto ALittle = 30ms;
 
@@ -193,14 +193,13 @@ TEST_F(Locks, ObjectsThatCannotBeMadeAreRefusedWithTheirPlace) {
 TEST_F(Locks, WaitThatFailsIsAnInvalidMutex) {
     Mutex mutex(UniqueName());
     MakeFail("Wait");
-    EXPECT_THAT([&] { mutex.TryLock(0); }, ThrowsMessage<InvalidArgumentException>(StrEq("invalid mutex")));
+    ExpectThrow<InvalidArgumentException>("invalid mutex", [&] { mutex.TryLock(0); });
 }
 
 TEST_F(Locks, AbandonedMutexIsReportedOnceAndThenFree) {
     Mutex mutex(UniqueName());
     std::thread([&] { mutex.Lock(); }).join();
-    EXPECT_THAT([&] { mutex.TryLock(1000); },
-                ThrowsMessage<InvalidArgumentException>(StrEq("invalid mutex")));
+    ExpectThrow<InvalidArgumentException>("invalid mutex", [&] { mutex.TryLock(1000); });
     EXPECT_TRUE(IsFree(mutex)) << "whoever was told of a failure does not hold the mutex";
 
     std::thread([&] { mutex.Lock(); }).join();

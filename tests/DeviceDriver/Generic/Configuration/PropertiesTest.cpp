@@ -2,14 +2,14 @@
 #include <gtest/gtest.h>
 
 #include "DeviceDriver/Generic/Configuration/Properties.h"
+#include "Support/ExpectThrow.h"
 #include "Utilities/Exceptions/Exceptions.h"
 
 namespace Varnholt::DeviceDriver::Generic::Configuration {
 namespace {
 
 using testing::ElementsAre;
-using testing::StrEq;
-using testing::ThrowsMessage;
+using Tests::ExpectThrow;
 using Varnholt::Utilities::Exceptions::ResourceException;
 using Varnholt::Utilities::Exceptions::RuntimeException;
 using Bytes = std::vector<std::uint8_t>;
@@ -35,9 +35,8 @@ TEST(Properties, KeepTheOrderInWhichIdentifiersWereFirstStored) {
 TEST(Properties, RefuseAnAbsentIdentifierByItsNumber) {
     Properties set;
     const Properties& readOnly = set;
-    EXPECT_THAT([&] { set.GetProperty(5); }, ThrowsMessage<ResourceException>(StrEq("id 5 doesn't exist")));
-    EXPECT_THAT([&] { readOnly.GetProperty(65535); },
-                ThrowsMessage<ResourceException>(StrEq("id 65535 doesn't exist")));
+    ExpectThrow<ResourceException>("id 5 doesn't exist", [&] { set.GetProperty(5); });
+    ExpectThrow<ResourceException>("id 65535 doesn't exist", [&] { readOnly.GetProperty(65535); });
     EXPECT_EQ(Properties::GetExceptionText(1234), "Requested data is not available (ID 1234)");
 }
 
@@ -77,8 +76,9 @@ TEST(Properties, DumpIsAStreamOfValuesWithOrWithoutIdentifiers) {
         EXPECT_EQ(longer[row.expected.size()], 0xAA);
 
         Bytes shorter(row.expected.size() - 1, 0xAA);
-        EXPECT_THAT([&] { set.Dump(shorter.begin(), shorter.end(), row.valuesOnly, row.bigEndian); },
-                    ThrowsMessage<ResourceException>(StrEq("Configuration data dump target too small")));
+        ExpectThrow<ResourceException>("Configuration data dump target too small", [&] {
+            set.Dump(shorter.begin(), shorter.end(), row.valuesOnly, row.bigEndian);
+        });
         EXPECT_EQ(shorter, Bytes(row.expected.size() - 1, 0xAA)) << "nothing may be written";
     }
 }
@@ -96,8 +96,8 @@ TEST(Properties, DumpStopsAtAnEntryWithoutAType) {
     set.SetProperty(1, Long(7));
     set.SetProperty(2, Property());
     Bytes bytes(16, 0xAA);
-    EXPECT_THAT([&] { set.Dump(bytes.begin(), bytes.end(), false, true); },
-                ThrowsMessage<RuntimeException>(StrEq("Invalid configuration data type.")));
+    ExpectThrow<RuntimeException>("Invalid configuration data type.",
+                                  [&] { set.Dump(bytes.begin(), bytes.end(), false, true); });
     EXPECT_EQ(Bytes(bytes.begin(), bytes.begin() + 6), (Bytes{0, 1, 0, 0, 0, 7}));
 }
 

@@ -5,6 +5,7 @@
 #include <limits>
 
 #include "DeviceDriver/Generic/Configuration/Property.h"
+#include "Support/ExpectThrow.h"
 #include "Utilities/Exceptions/Exceptions.h"
 
 namespace Varnholt::DeviceDriver::Generic::Configuration {
@@ -12,8 +13,7 @@ namespace {
 
 using testing::ElementsAre;
 using testing::IsEmpty;
-using testing::StrEq;
-using testing::ThrowsMessage;
+using Tests::ExpectThrow;
 using Varnholt::Utilities::Exceptions::RuntimeException;
 using Bytes = std::vector<std::uint8_t>;
 using Longs = std::vector<std::int32_t>;
@@ -122,11 +122,11 @@ TEST(Property, WithoutATypeOrAnElementNothingIsRead) {
     Property none;
     const Property noIntegers((Longs()));
     const Property noFloats((Floats()));
-    EXPECT_THAT([&] { none.Assign(Bytes(4), true); }, ThrowsMessage<RuntimeException>(StrEq(InvalidType)));
-    EXPECT_THAT([&] { none.AsByteVector(true); }, ThrowsMessage<RuntimeException>(StrEq(InvalidType)));
-    EXPECT_THAT([&] { noIntegers.AsLong(); }, ThrowsMessage<RuntimeException>(StrEq(InvalidType)));
-    EXPECT_THAT([&] { Property(1.0F).AsLong(); }, ThrowsMessage<RuntimeException>(StrEq(InvalidType)));
-    EXPECT_THAT([&] { noFloats.AsFloat(); }, ThrowsMessage<RuntimeException>(StrEq(InvalidType)));
+    ExpectThrow<RuntimeException>(InvalidType, [&] { none.Assign(Bytes(4), true); });
+    ExpectThrow<RuntimeException>(InvalidType, [&] { none.AsByteVector(true); });
+    ExpectThrow<RuntimeException>(InvalidType, [&] { noIntegers.AsLong(); });
+    ExpectThrow<RuntimeException>(InvalidType, [&] { Property(1.0F).AsLong(); });
+    ExpectThrow<RuntimeException>(InvalidType, [&] { noFloats.AsFloat(); });
 }
 
 }  // namespace

@@ -1,4 +1,3 @@
-#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <map>
@@ -7,14 +6,14 @@
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
+#include "Support/ExpectThrow.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace {
 
 using namespace Generic::Configuration;
 using Generic::Utilities::DataException;
-using testing::StrEq;
-using testing::ThrowsMessage;
+using Tests::ExpectThrow;
 using Ids = std::set<int>;
 
 /// Calibration, log, misc and measure parameters show in what the memory model loads.
@@ -71,9 +70,9 @@ TEST(ConfigurationDataConverter, EveryIdentifierHasItsDefaultOrNone) {
             ASSERT_EQ(value.GetType(), known->second->type);
             ASSERT_EQ(value.AsByteVector(true), std::vector<std::uint8_t>(4 * known->second->elements, 0));
         } else {
-            ASSERT_THAT(
-                [&] { ConfigurationDataConverter::GetDefaultProperty(static_cast<std::uint16_t>(id)); },
-                ThrowsMessage<DataException>(StrEq("invalid property id " + std::to_string(id))));
+            ExpectThrow<DataException>("invalid property id " + std::to_string(id), [id] {
+                ConfigurationDataConverter::GetDefaultProperty(static_cast<std::uint16_t>(id));
+            });
         }
     }
 }

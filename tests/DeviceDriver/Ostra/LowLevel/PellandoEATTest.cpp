@@ -12,6 +12,7 @@
 #include "FakeCommands.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
+#include "Support/ExpectThrow.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace {
@@ -19,8 +20,7 @@ namespace {
 namespace EepromMap = Protocol::EepromMap;
 using namespace Generic::Configuration;
 using Generic::Utilities::DataException;
-using testing::StrEq;
-using testing::ThrowsMessage;
+using Tests::ExpectThrow;
 using Varnholt::Utilities::Exceptions::ResourceException;
 using Entries = std::vector<std::pair<std::uint16_t, std::int32_t>>;
 using Longs = std::vector<std::int32_t>;
@@ -79,10 +79,10 @@ TEST_F(FreshTable, SizeIsTheDistanceToTheNextEntry) {
     for (const auto& [id, size] : sizes) {
         EXPECT_EQ(table.SizeOf(id), size) << id;
     }
-    EXPECT_THAT([&] { table.SizeOf(5); }, ThrowsMessage<ResourceException>(StrEq("id 5 doesn't exist")));
-    EXPECT_THAT([&] { table.AddressOf(5); }, ThrowsMessage<ResourceException>(StrEq("id 5 doesn't exist")));
-    EXPECT_THAT([&] { table.SizeOf(2); }, ThrowsMessage<ResourceException>(StrEq("id 2 doesn't exist")))
-        << "nothing says where the last entry ends";
+    ExpectThrow<ResourceException>("id 5 doesn't exist", [&] { table.SizeOf(5); });
+    ExpectThrow<ResourceException>("id 5 doesn't exist", [&] { table.AddressOf(5); });
+    // Nothing says where the last entry ends.
+    ExpectThrow<ResourceException>("id 2 doesn't exist", [&] { table.SizeOf(2); });
 }
 
 TEST_F(FreshTable, LogAreaEndsBelow4096) {
@@ -111,9 +111,8 @@ TEST(PellandoEAT, HeaderDecidesWhetherAndHowFarTheTableIsRead) {
         PellandoEAT table;
         table.InitializeEmtpyEAT();
         if (row.entries == 0) {
-            EXPECT_THAT([&] { table.ParseBuffer(bytes.data()); },
-                        ThrowsMessage<DataException>(StrEq(Corrupt)));
-            EXPECT_THAT([&] { PellandoEAT{bytes.begin()}; }, ThrowsMessage<DataException>(StrEq(Corrupt)));
+            ExpectThrow<DataException>(Corrupt, [&] { table.ParseBuffer(bytes.data()); });
+            ExpectThrow<DataException>(Corrupt, [&] { PellandoEAT{bytes.begin()}; });
             EXPECT_EQ(EntriesOf(table), Fresh);
         } else {
             table.ParseBuffer(bytes.data());
@@ -137,22 +136,16 @@ TEST(PellandoEAT, DumpNeedsRoomForHeaderAndEntries) {
     table.InitializeEmtpyEAT();
     constexpr const char* tooSmall = "Configuration data dump target too small";
     Bytes bytes(333, 0xAA);
-    EXPECT_THAT([&] { table.Dump(bytes.begin(), bytes.end()); },
-                ThrowsMessage<ResourceException>(StrEq(tooSmall)));
+    ExpectThrow<ResourceException>(tooSmall, [&] { table.Dump(bytes.begin(), bytes.end()); });
     EXPECT_EQ(Bytes(bytes.begin(), bytes.begin() + 5), (Bytes{0, 1, 0x01, 0x4E, 0xAA})) << "header only";
-    EXPECT_THAT([&] { table.Dump(bytes.begin(), bytes.begin() + 3); },
-                ThrowsMessage<ResourceException>(StrEq(tooSmall)));
+    ExpectThrow<ResourceException>(tooSmall, [&] { table.Dump(bytes.begin(), bytes.begin() + 3); });
 }
 
-TEST(PellandoEAT, DefaultSetsAreMadeOnce) {
+TEST(PellandoEAT, DefaultSetsHaveTheirSizesAndValues) {
     const Properties& log = PellandoEAT::GetDefaultLogData();
     const Properties& calibration = PellandoEAT::GetDefaultCalibrationData();
-    EXPECT_EQ(&PellandoEAT::GetDefaultLogData(), &log);
-    EXPECT_EQ(&PellandoEAT::GetDefaultCalibrationData(), &calibration);
-    EXPECT_EQ(log.GetName(), "LogData");
-    EXPECT_EQ(calibration.GetName(), "CalibrationData");
-    EXPECT_EQ(log.GetItemCount(), 12U);
-    EXPECT_EQ(calibration.GetItemCount(), 28U);
+    EXPECT_EQ(&PellandoEAT::GetDefaultLogData(), &log) << "made once";
+    EXPECT_EQ(log.GetName() + " " + calibration.GetName(), "LogData CalibrationData");
     EXPECT_EQ(log.SizeOf(true), 1064U);
     EXPECT_EQ(calibration.SizeOf(true), 148U);
     EXPECT_EQ(calibration.GetProperty(1002).AsLongVector(), (Longs{-1, -1}));
@@ -223,28 +216,26 @@ TEST_F(FreshTable, EnsureConsistencyThatFailsChangesNothing) {
     set.SetProperty(1000, Property(Longs{1, 2, 3}));
     set.SetProperty(1001, Property(Longs{1, 2, 3}));
     set.SetProperty(77, Property(std::int32_t{1}));
-    EXPECT_THAT([&] { table.EnsureConsistency(set); },
-                ThrowsMessage<ResourceException>(StrEq("id 77 doesn't exist")));
+    ExpectThrow<ResourceException>("id 77 doesn't exist", [&] { table.EnsureConsistency(set); });
     EXPECT_EQ(EntriesOf(table), Fresh);
 
     const Bytes image = FreshImage();
     PellandoLog log(table, image.begin());
     log.SetItem(10001, Property(Longs{1, 2}));
     log.SetItem(10100, Property(std::int32_t{1}));
-    EXPECT_THAT([&] { table.EnsureConsistency(log); },
-                ThrowsMessage<ResourceException>(StrEq("id 10100 doesn't exist")));
+    ExpectThrow<ResourceException>("id 10100 doesn't exist", [&] { table.EnsureConsistency(log); });
     EXPECT_EQ(EntriesOf(table), Fresh);
 }
 
 TEST_F(FreshTable, AddressesBeyond32BitsAreCorrupt) {
     table.GetDatastore().GetProperty(1001).Assign(std::int32_t{-2147483647});
     table.GetDatastore().GetProperty(1002).Assign(std::int32_t{2147483647});
-    EXPECT_THAT([&] { table.SizeOf(1001); }, ThrowsMessage<DataException>(StrEq(Corrupt)));
+    ExpectThrow<DataException>(Corrupt, [&] { table.SizeOf(1001); });
     Properties set;
     set.SetProperty(1000, Property(Longs{1, 2, 3}));
     set.SetProperty(1002, Property(Longs{1, 2}));
     const Entries before = EntriesOf(table);
-    EXPECT_THAT([&] { table.EnsureConsistency(set); }, ThrowsMessage<DataException>(StrEq(Corrupt)));
+    ExpectThrow<DataException>(Corrupt, [&] { table.EnsureConsistency(set); });
     EXPECT_EQ(EntriesOf(table), before);
 }
 
@@ -300,7 +291,7 @@ TEST(SectionReader, FollowsTheTableWhereItCanBeUsedAndRefusesItWhereNot) {
         const Bytes image = FreshImage();
         const SectionReader read(table, &ConfigurationDataConverter::IsCalibrationParameter);
         if (row.elements == refused) {
-            EXPECT_THAT([&] { read(image.data(), 0); }, ThrowsMessage<DataException>(StrEq(Corrupt)));
+            ExpectThrow<DataException>(Corrupt, [&] { read(image.data(), 0); });
         } else {
             const Properties section = read(image.data(), 0);
             EXPECT_EQ(section.GetProperty(3010).AsLongVector().size(), row.elements);
@@ -314,15 +305,13 @@ TEST(SectionReader, RefusesWhatTheTableDoesNotSay) {
     PellandoEAT lastHasNoEnd;
     lastHasNoEnd.CreateSection({}, 4608, 3010, 0);
     const SectionReader readCalibration(lastHasNoEnd, &ConfigurationDataConverter::IsCalibrationParameter);
-    EXPECT_THAT([&] { readCalibration(image.data(), 0); },
-                ThrowsMessage<ResourceException>(StrEq("id 3010 doesn't exist")));
+    ExpectThrow<ResourceException>("id 3010 doesn't exist", [&] { readCalibration(image.data(), 0); });
 
     PellandoEAT withoutCopy;
     withoutCopy.CreateSection(PellandoEAT::GetDefaultLogData(), 0, 1, 0);
     const SectionReader readLog(withoutCopy, &ConfigurationDataConverter::IsLogParameter);
     EXPECT_EQ(readLog(image.data(), 0).GetItemCount(), 12U);
-    EXPECT_THAT([&] { readLog(image.data(), 1000); },
-                ThrowsMessage<ResourceException>(StrEq("id 11000 doesn't exist")));
+    ExpectThrow<ResourceException>("id 11000 doesn't exist", [&] { readLog(image.data(), 1000); });
 }
 
 }  // namespace

@@ -9,6 +9,7 @@
 #include "FakeCommands.h"
 #include "ImageCheck.h"
 #include "Protocol/ByteOrder.h"
+#include "Support/ExpectThrow.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace {
@@ -19,8 +20,7 @@ using Generic::Utilities::IOException;
 using testing::ElementsAre;
 using testing::ElementsAreArray;
 using testing::IsEmpty;
-using testing::StrEq;
-using testing::ThrowsMessage;
+using Tests::ExpectThrow;
 using Varnholt::Utilities::Exceptions::ResourceException;
 using Varnholt::Utilities::Exceptions::RuntimeException;
 using Longs = std::vector<std::int32_t>;
@@ -51,8 +51,7 @@ class EepromTest : public testing::Test {
         eeprom->Store(set);
     }
     void ExpectLocked() {
-        EXPECT_THAT([&] { eeprom->Lock(); },
-                    ThrowsMessage<ResourceException>(StrEq("EEPROM already locked")));
+        ExpectThrow<ResourceException>("EEPROM already locked", [&] { eeprom->Lock(); });
     }
 
     FakeInstrument instrument;
@@ -69,15 +68,14 @@ TEST_F(EepromTest, IsReadInTwoHalvesAndThenServedFromMemory) {
     EXPECT_EQ(eeprom->Load(10010).AsLongVector(), Longs(128, 0));
     EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
     for (const std::uint16_t id : std::vector<std::uint16_t>{2009, 5, 11000, 10100, 20001, 20002, 65535}) {
-        EXPECT_THAT([&] { eeprom->Load(id); },
-                    ThrowsMessage<ResourceException>(StrEq("unknown property id = " + std::to_string(id))));
+        ExpectThrow<ResourceException>("unknown property id = " + std::to_string(id),
+                                       [&] { eeprom->Load(id); });
     }
 }
 
 TEST_F(EepromTest, CannotBeBuiltFromWhatCannotBeUsed) {
     Protocol::StoreBig16(&instrument.eeprom[4096], 2);
-    EXPECT_THAT([&] { PellandoEEPROM broken(Open(instrument)); },
-                ThrowsMessage<DataException>(StrEq("corrupt EAT detected!!")));
+    ExpectThrow<DataException>("corrupt EAT detected!!", [&] { PellandoEEPROM broken(Open(instrument)); });
     EXPECT_EQ(instrument.TakeCommands().size(), 2U) << "nothing may be written";
     instrument.eeprom = FreshImage();
     for (const std::size_t command : {0U, 1U}) {
@@ -114,8 +112,7 @@ TEST_F(EepromTest, LoadFillsSetsByNameOrByIdentifier) {
     EXPECT_EQ(some.GetProperty(2005).AsLong(), 7);
     EXPECT_EQ(some.GetProperty(3009).AsLongVector(), (Longs{-1, -1}));
     some.SetProperty(20001, Long(1));
-    EXPECT_THAT([&] { eeprom->Load(some); },
-                ThrowsMessage<ResourceException>(StrEq("unknown property id = 20001")));
+    ExpectThrow<ResourceException>("unknown property id = 20001", [&] { eeprom->Load(some); });
 }
 
 TEST_F(EepromTest, StoreObeysItsRequests) {
@@ -163,12 +160,10 @@ TEST_F(EepromTest, FailedWriteThroughLocksAgain) {
 TEST_F(EepromTest, LockGuardsWriteThrough) {
     Load();
     ExpectLocked();
-    EXPECT_THAT([&] { eeprom->WriteThrough(); },
-                ThrowsMessage<ResourceException>(StrEq("EEPROM access denied")));
+    ExpectThrow<ResourceException>("EEPROM access denied", [&] { eeprom->WriteThrough(); });
     EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
     eeprom->Unlock();
-    EXPECT_THAT([&] { eeprom->Unlock(); },
-                ThrowsMessage<ResourceException>(StrEq("EEPROM already unlocked")));
+    ExpectThrow<ResourceException>("EEPROM already unlocked", [&] { eeprom->Unlock(); });
     eeprom->WriteThrough();
     EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
 }
@@ -236,8 +231,7 @@ TEST_F(EepromTest, BinaryDataThatDoesNotFitIsRefusedBeforeAnythingIsWritten) {
         const Bytes data(row.size, 0x55);
         const Bytes before = instrument.eeprom;
         if (row.refusal) {
-            EXPECT_THAT([&] { eeprom->StoreBinary(row.id, data); },
-                        ThrowsMessage<ResourceException>(StrEq(row.refusal)));
+            ExpectThrow<ResourceException>(row.refusal, [&] { eeprom->StoreBinary(row.id, data); });
             EXPECT_EQ(instrument.eeprom, before);
         } else {
             eeprom->StoreBinary(row.id, data);
@@ -284,8 +278,7 @@ TEST(EepromImages, ValuesThatChangedTheirSizeReadBackRight) {
 TEST_F(EepromTest, DumpRefusesWhatCannotBeReadBack) {
     Load();
     eeprom->SetProperty(3013, Property(Longs(861, 9)));
-    EXPECT_THAT([&] { eeprom->Dump(); },
-                ThrowsMessage<ResourceException>(StrEq("Configuration data dump target too small")));
+    ExpectThrow<ResourceException>("Configuration data dump target too small", [&] { eeprom->Dump(); });
     eeprom->SetProperty(3013, Long(9));
     EXPECT_EQ(Protocol::LoadBig32(&eeprom->Dump()[4752]), 9U) << "and can when it fits again";
 
@@ -307,7 +300,7 @@ TEST_F(EepromTest, DumpRefusesWhatCannotBeReadBack) {
         Protocol::StoreBig16(entry, row.id);
         Protocol::StoreBig32(entry + 2, row.address);
         Load();
-        EXPECT_THAT([&] { eeprom->Dump(); }, ThrowsMessage<DataException>(StrEq("corrupt EAT detected!!")));
+        ExpectThrow<DataException>("corrupt EAT detected!!", [&] { eeprom->Dump(); });
     }
 }
 
@@ -339,8 +332,7 @@ TEST_F(EepromTest, LogThatOutgrowsItsAreaNeverReachesTheTable) {
     std::string reason;
     eeprom->ReportLostLog([&](const std::string& text) { reason = text; });
     eeprom->SetProperty(10021, Property(Longs(248, 1)));
-    EXPECT_THAT([&] { eeprom->DumpLog(); },
-                ThrowsMessage<ResourceException>(StrEq("Configuration data dump target too small")));
+    ExpectThrow<ResourceException>("Configuration data dump target too small", [&] { eeprom->DumpLog(); });
     eeprom.reset();
     EXPECT_EQ(reason, "Configuration data dump target too small");
     EXPECT_EQ(instrument.eeprom, FreshImage());
