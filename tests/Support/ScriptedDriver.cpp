@@ -74,12 +74,7 @@ void ScriptedDriver::DropScript(std::uint32_t place) {
     scripts[place].clear();
 }
 
-void ScriptedDriver::RefuseOpen(const std::string& path, ErrorCode code) {
-    const std::lock_guard held(lock);
-    refusals[path] = code;
-}
-
-void ScriptedDriver::BeforeOpen(const std::string& path, std::function<void()> action) {
+void ScriptedDriver::OnOpen(const std::string& path, std::function<ErrorCode()> action) {
     const std::lock_guard held(lock);
     openActions[path] = std::move(action);
 }
@@ -152,30 +147,21 @@ std::vector<std::string> ScriptedDriver::ListInterfaces(const Protocol::Guid& in
 }
 
 Handle ScriptedDriver::Open(const std::string& path) {
-    std::function<void()> action;
+    std::function<ErrorCode()> action;
     {
         const std::lock_guard held(lock);
         if (const auto found = openActions.find(path); found != openActions.end()) {
             action = found->second;
         }
     }
-    if (action) {
-        action();
+    if (const ErrorCode refusal = action ? action() : Errors::Success; refusal != Errors::Success) {
+        SetLastError(refusal);
+        return InvalidHandle();
     }
-    ErrorCode refusal = Errors::Success;
-    Handle opened = InvalidHandle();
-    {
-        const std::lock_guard held(lock);
-        if (const auto refused = refusals.find(path); refused != refusals.end()) {
-            refusal = refused->second;
-        } else {
-            transcript.push_back("open " + path);
-            files.push_back(std::make_unique<File>(File{path, PipeOf(path)}));
-            opened = files.back().get();
-        }
-    }
-    SetLastError(refusal);
-    return opened;
+    const std::lock_guard held(lock);
+    transcript.push_back("open " + path);
+    files.push_back(std::make_unique<File>(File{path, PipeOf(path)}));
+    return files.back().get();
 }
 
 ScriptedDriver::File* ScriptedDriver::Find(Handle handle) {

@@ -57,9 +57,11 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
 
     void Script(std::uint32_t place, Answer answer);
     void DropScript(std::uint32_t place);
-    void RefuseOpen(const std::string& path, Platform::ErrorCode code);
-    /// Called by every opener of the path, who waits for its end.
-    void BeforeOpen(const std::string& path, std::function<void()> action);
+    /// Called by every opener of the path: fails with its code, or goes on with `Success`.
+    void OnOpen(const std::string& path, std::function<Platform::ErrorCode()> action);
+    void RefuseOpen(const std::string& path, Platform::ErrorCode code) {
+        OnOpen(path, [code] { return code; });
+    }
     /// Completes the oldest running transfer of the pipe or endpoint, as it was scripted or with another
     /// answer; false if none runs.
     bool Complete(std::uint32_t place) { return CompleteAs(place, nullptr); }
@@ -122,8 +124,7 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     std::deque<std::unique_ptr<File>> files;
     std::deque<Transfer> running;
     std::map<std::uint32_t, std::deque<Answer>> scripts;
-    std::map<std::string, Platform::ErrorCode> refusals;
-    std::map<std::string, std::function<void()>> openActions;
+    std::map<std::string, std::function<Platform::ErrorCode()>> openActions;
     std::vector<std::string> transcript;
     std::vector<Platform::EventScheduler::EventId> events;
     std::map<std::uint32_t, std::uint64_t> bytesIn;

@@ -247,11 +247,10 @@ TEST_F(NativeInterruptListener, IsBoundedWhateverHoldsUpTheOpeningOfThePipe) {
         SCOPED_TRACE(row.name);
         ScriptedDriver slow;
         const ScopedDeviceFiles inForce(slow);
-        if (row.opensAfter == 0) {
-            slow.RefuseOpen(InterruptPath, Errors::FileNotFound);
-        } else {
-            slow.BeforeOpen(InterruptPath, [&] { SleepMilliseconds(row.opensAfter); });
-        }
+        slow.OnOpen(InterruptPath, [&] {
+            SleepMilliseconds(row.opensAfter);
+            return row.transcript.empty() ? Errors::FileNotFound : Errors::Success;
+        });
         const Stopwatch watch(clock);
         {
             InterruptListener other("native/1");

@@ -1,6 +1,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <memory>
 #include <string>
 
@@ -49,6 +50,11 @@ class EepromTest : public testing::Test {
             set.SetProperty(id, Long(value));
         }
         eeprom->Store(set);
+    }
+    void ChangeLog(int times) {
+        for (int change = 1; change <= times; ++change) {
+            eeprom->SetProperty(10002, Long(change));
+        }
     }
     void ExpectLocked() {
         ExpectThrow<ResourceException>("EEPROM already locked", [&] { eeprom->Lock(); });
@@ -170,9 +176,7 @@ TEST_F(EepromTest, LockGuardsWriteThrough) {
 
 TEST_F(EepromTest, DueLogIsWrittenBeforeTheNextChange) {
     Load();
-    for (int change = 1; change <= 20; ++change) {
-        eeprom->SetProperty(10002, Long(change));
-    }
+    ChangeLog(20);
     EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
     eeprom->GetLog();
     eeprom->GetLog(false);
@@ -186,9 +190,7 @@ TEST_F(EepromTest, DueLogIsWrittenBeforeTheNextChange) {
 TEST_F(EepromTest, BinaryAreasAreWrittenAndReadDirectly) {
     Load();
     Bytes block(1904);
-    for (std::size_t i = 0; i < block.size(); ++i) {
-        block[i] = static_cast<std::uint8_t>(i * 7);
-    }
+    std::ranges::generate(block, [byte = std::uint8_t{0}]() mutable { return byte += 7; });
     eeprom->StoreBinary(10100, block);
     EXPECT_THAT(instrument.TakeCommands(),
                 ElementsAre(Command{"WriteEEPROM", 1064, 256}, Command{"WriteEEPROM", 1320, 256},
@@ -245,9 +247,7 @@ TEST_F(EepromTest, DumpOfAFreshInstrumentIsTheFreshImage) {
     Load();
     EXPECT_EQ(eeprom->Dump(), FreshImage());
     EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
-    for (int change = 1; change <= 20; ++change) {
-        eeprom->SetProperty(10002, Long(change));
-    }
+    ChangeLog(20);
     const Bytes image = eeprom->Dump();
     EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites)) << "which was due";
     EXPECT_EQ(Protocol::LoadBig32(&image[2048 + 8]), 20U);

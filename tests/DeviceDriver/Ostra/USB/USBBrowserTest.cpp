@@ -1,63 +1,79 @@
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-
-#include <memory>
-#include <optional>
-
+#include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
 #include "Platform/CallFilter.h"
-#include "Platform/Drivers/DriverFileSystem.h"
 #include "Platform/HostQueries.h"
-#include "Support/ScriptedUsbDevice.h"
+#include "Support/DriverTest.h"
+#include "Support/Transport.h"
 
 namespace Varnholt::Tests {
 namespace {
 
+using namespace Platform;
+using DeviceDriver::Ostra::LowLevel::PellandoUSBDevice;
 using DeviceDriver::Ostra::USB::USBBrowser;
-using testing::ElementsAre;
 using testing::IsEmpty;
 
-/// Both transports list the same bus; the path tells which of them was asked.
-class Browser : public testing::TestWithParam<bool> {
+class Browser : public DriverTest, public testing::WithParamInterface<Transport> {
   protected:
-    void SetUp() override { Platform::Override64BitHost(GetParam()); }
-    void TearDown() override {
-        Platform::InstallCallFilter({});
-        Platform::Override64BitHost(std::nullopt);
+    Browser() { Override64BitHost(!IsNative()); }
+    ~Browser() override {
+        InstallCallFilter({});
+        Override64BitHost(std::nullopt);
     }
-    std::string Path(const std::string& port) const { return (GetParam() ? "usbio/" : "native/") + port; }
 
-    ScriptedBus bus;
-    const std::unique_ptr<Platform::DeviceFileSystem> drivers = Platform::Drivers::MakeDriverFileSystem(bus);
-    const Platform::ScopedDeviceFiles inForce{*drivers};
+    static bool IsNative() { return GetParam() == Transport::Native; }
+    static Lines Paths(std::size_t count) {
+        Lines paths;
+        for (std::size_t i = 0; i < count; ++i) {
+            paths.push_back(Name(GetParam()) + ("/" + std::to_string(i)));
+        }
+        return paths;
+    }
 };
 
-TEST_P(Browser, ListsAfreshWhatIsPluggedIn) {
+TEST_P(Browser, ListsAfreshUpTo127Instruments) {
     const auto browser = USBBrowser::Instance();
     EXPECT_NE(browser.Get(), USBBrowser::Instance().Get());
-    EXPECT_THAT(browser->GetDevices(0), IsEmpty());
-    EXPECT_FALSE(browser->IsAnyOstraConnected());
-
-    bus.Plug("port1", std::make_shared<ScriptedUsbDevice>());
-    bus.Plug("port2", std::make_shared<ScriptedUsbDevice>());
-    for (const std::int32_t selector : {0, 1}) {
-        EXPECT_THAT(browser->GetDevices(selector), ElementsAre(Path("port1"), Path("port2")));
+    for (const std::size_t count : {0u, 1u, 3u, 127u, 130u}) {
+        ScriptedDriver connected(Paths(count));
+        const ScopedDeviceFiles inForce(connected);
+        for (const std::int32_t selector : {0, 1}) {
+            EXPECT_THAT(browser->GetDevices(selector),
+                        testing::ElementsAreArray(Paths(std::min<std::size_t>(count, 127))));
+        }
+        EXPECT_EQ(browser->IsAnyOstraConnected(), count > 0);
+        EXPECT_EQ(connected.OpenFiles(), 0U);
+        if (IsNative()) {
+            EXPECT_EQ(PellandoUSBDevice::ScanDevice(2), count > 2 ? Paths(3)[2] : "");
+            EXPECT_EQ(PellandoUSBDevice::ScanDevice(static_cast<std::uint16_t>(count)), "");
+            EXPECT_EQ(PellandoUSBDevice::ScanDevice(0xFFFF), "");
+        }
     }
-    EXPECT_TRUE(browser->IsAnyOstraConnected());
-
-    bus.Unplug("port1");
-    EXPECT_THAT(browser->GetDevices(0), ElementsAre(Path("port2")));
 }
 
 TEST_P(Browser, ListsNothingWhenThePlatformCannotTell) {
-    bus.Plug("port1", std::make_shared<ScriptedUsbDevice>());
-    Platform::InstallCallFilter([](std::string_view call) {
-        return call == "MakeList" ? Platform::Errors::NotEnoughMemory : Platform::Errors::Success;
-    });
-    EXPECT_THAT(USBBrowser::Instance()->GetDevices(0), IsEmpty());
+    for (const char* call : {"MakeList", "LoadEnumeration", "FindInterface", "DetailSize", "ReadDetail"}) {
+        SCOPED_TRACE(call);
+        bool wasAsked = false;
+        InstallCallFilter([&](std::string_view name) {
+            wasAsked = wasAsked || name == call;
+            return name == call ? Errors::InvalidData : Errors::Success;
+        });
+        EXPECT_THAT(USBBrowser::Instance()->GetDevices(0), IsEmpty());
+        EXPECT_TRUE(wasAsked);
+    }
 }
 
-INSTANTIATE_TEST_SUITE_P(Transports, Browser, testing::Bool());
+TEST_P(Browser, ListsOverUsbIoOnlyWhatOpens) {
+    ScriptedDriver three(Paths(3));
+    const ScopedDeviceFiles inForce(three);
+    three.RefuseOpen(Paths(2)[1], Errors::AccessDenied);
+    const auto devices = USBBrowser::Instance()->GetDevices(0);
+    EXPECT_THAT(devices, testing::ElementsAreArray(Paths(IsNative() ? 3 : 1)));
+}
+
+INSTANTIATE_TEST_SUITE_P(Transports, Browser, testing::Values(Transport::Native, Transport::UsbIo),
+                         [](const auto& parameter) { return std::string(Name(parameter.param)); });
 
 }  // namespace
 }  // namespace Varnholt::Tests

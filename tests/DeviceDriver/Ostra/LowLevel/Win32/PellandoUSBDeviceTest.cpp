@@ -1,4 +1,3 @@
-#include <algorithm>
 #include <atomic>
 #include <functional>
 
@@ -264,42 +263,6 @@ TEST_F(NativeDevice, ClosesInTimeWhileAMessageWaitsForTheDeviceLock) {
     holder.Join();
     SleepMilliseconds(10);
     EXPECT_THAT(listener.Codes(), IsEmpty());
-}
-
-TEST(NativeDeviceList, NamesThePathsInOrderUpTo127) {
-    const TestClock clock(TestTime::Virtual);
-    for (const std::size_t count : {0u, 1u, 3u, 127u, 130u}) {
-        Lines paths;
-        for (std::size_t i = 0; i < count; ++i) {
-            paths.push_back("native/" + std::to_string(i));
-        }
-        ScriptedDriver driver(paths);
-        const ScopedDeviceFiles files(driver);
-        EXPECT_EQ(PellandoUSBDevice::ScanDevice(static_cast<std::uint16_t>(count)), "");
-        EXPECT_EQ(PellandoUSBDevice::ScanDevice(0xFFFF), "");
-        if (count > 2) {
-            EXPECT_EQ(PellandoUSBDevice::ScanDevice(2), "native/2");
-        }
-        paths.resize(std::min<std::size_t>(count, 127));
-        EXPECT_EQ(PellandoUSBDevice::GetAllDevices(), paths);
-    }
-}
-
-TEST(NativeDeviceList, IsEmptyWhenThePlatformCannotTell) {
-    const TestClock clock(TestTime::Virtual);
-    ScriptedDriver driver;
-    const ScopedDeviceFiles files(driver);
-    for (const char* call : {"MakeList", "LoadEnumeration", "FindInterface", "DetailSize", "ReadDetail"}) {
-        SCOPED_TRACE(call);
-        bool wasAsked = false;
-        InstallCallFilter([&](std::string_view name) {
-            wasAsked = wasAsked || name == call;
-            return name == call ? Errors::InvalidData : Errors::Success;
-        });
-        EXPECT_THAT(PellandoUSBDevice::GetAllDevices(), IsEmpty());
-        InstallCallFilter({});
-        EXPECT_TRUE(wasAsked);
-    }
 }
 
 TEST(NativeDeviceName, KeepsLettersAndDigits) {

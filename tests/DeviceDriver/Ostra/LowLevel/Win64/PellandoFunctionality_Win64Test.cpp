@@ -1,4 +1,3 @@
-#include "DeviceDriver/Ostra/USB/Win64/USBBrowserImpl_Win64.h"
 #include "Platform/CallFilter.h"
 #include "Protocol/UsbIoDriver.h"
 #include "UsbIoTest.h"
@@ -9,7 +8,6 @@ namespace {
 using namespace Protocol::UsbIoDriver;
 using DeviceDriver::Ostra::LowLevel::Bytes2;
 using DeviceDriver::Ostra::LowLevel::PellandoFunctionality_Win64;
-using DeviceDriver::Ostra::USB::USBBrowserImpl_Win64;
 using Protocol::BulkInEndpoint;
 using testing::ElementsAre;
 using testing::ElementsAreArray;
@@ -123,24 +121,6 @@ TEST_F(UsbIoOpening, EachStepOfTheConfigurationCanFail) {
     });
     ExpectFailure("could not create interrupt listener thread", 0);
     Platform::InstallCallFilter({});
-}
-
-TEST_F(UsbIoOpening, TheBrowserListsWhatOpens) {
-    USBBrowserImpl_Win64 browser;
-    for (const std::int32_t selector : {0, 1}) {
-        EXPECT_THAT(browser.GetDevices(selector), ElementsAre("usbio/1", "usbio/2", "usbio/3"));
-    }
-    EXPECT_TRUE(browser.IsAnyOstraConnected());
-    driver.RefuseOpen("usbio/2", Platform::Errors::AccessDenied);
-    EXPECT_THAT(browser.GetDevices(0), ElementsAre("usbio/1"));
-    driver.RefuseOpen("usbio/1", Platform::Errors::AccessDenied);
-    EXPECT_FALSE(browser.IsAnyOstraConnected());
-}
-
-TEST(USBBrowserImpl_Win64, ListsNoMoreThan127) {
-    ScriptedDriver many(Lines(130, "usbio/x"));
-    const Platform::ScopedDeviceFiles files(many);
-    EXPECT_EQ(USBBrowserImpl_Win64().GetDevices(0).size(), 127U);
 }
 
 }  // namespace
