@@ -7,7 +7,6 @@
 
 namespace Varnholt::Tests {
 
-using Platform::ErrorCode;
 using Platform::Usb::SetupPacket;
 using Platform::Usb::Transfer;
 using Platform::Usb::TransferStatus;
@@ -53,48 +52,6 @@ std::string Hex(const std::uint8_t* bytes, std::size_t count) {
         text += Digits[bytes[i] & 0x0F];
     }
     return text;
-}
-
-Exchange Exchange::Ends(TransferStatus how, std::uint32_t bytes) const {
-    Exchange row = *this;
-    row.status = how;
-    row.moved = bytes;
-    return row;
-}
-
-Exchange Exchange::Refused(ErrorCode code) const {
-    Exchange row = *this;
-    row.refusal = code;
-    return row;
-}
-
-Exchange Exchange::AtOnce() const {
-    Exchange row = *this;
-    row.when = When::AtOnce;
-    return row;
-}
-
-Exchange Exchange::After(std::uint64_t microseconds) const {
-    Exchange row = *this;
-    row.when = When::Later;
-    row.delay = microseconds;
-    return row;
-}
-
-Exchange Exchange::OnDemand() const {
-    Exchange row = *this;
-    row.when = When::OnDemand;
-    return row;
-}
-
-Exchange Exchange::MovesWhenCancelled(std::uint32_t bytes) const {
-    Exchange row = *this;
-    row.movedWhenCancelled = bytes;
-    return row;
-}
-
-bool Exchange::IsIn() const {
-    return endpoint == 0 ? setup.IsIn() : (endpoint & 0x80) != 0;
 }
 
 std::string Exchange::Describe() const {

@@ -26,7 +26,7 @@ std::string Describe(const Platform::Usb::Transfer& transfer);
 ///     BulkIn(512, Counting(512)).Ends(TransferStatus::Stalled, 100)
 struct Exchange {
     enum class Kind { Transfer, ClearHalt };
-    enum class When { AsPaced, AtOnce, Later, OnDemand };
+    static constexpr std::uint64_t Never = ~std::uint64_t{0};
 
     Kind kind = Kind::Transfer;
     std::uint8_t endpoint = 0;
@@ -39,23 +39,33 @@ struct Exchange {
     std::uint32_t moved = 0;  ///< bytes moved at completion
     std::uint32_t movedWhenCancelled = 0;
     Platform::ErrorCode refusal = Platform::Errors::Success;  ///< `Submit` or `ClearHalt` answers this
-    When when = When::AsPaced;
-    std::uint64_t delay = 0;  ///< microseconds, with `When::Later`
+    std::uint64_t delay = 0;                                  ///< microseconds; 0: inside `Submit`
 
     /// Ends with this status after this many bytes.
-    Exchange Ends(Platform::Usb::TransferStatus how, std::uint32_t bytes = 0) const;
+    Exchange Ends(Platform::Usb::TransferStatus how, std::uint32_t bytes = 0) const {
+        return With(&Exchange::status, how).With(&Exchange::moved, bytes);
+    }
     /// Is not accepted, with this code.
-    Exchange Refused(Platform::ErrorCode code) const;
-    Exchange AtOnce() const;
+    Exchange Refused(Platform::ErrorCode code) const { return With(&Exchange::refusal, code); }
     /// Completes that many microseconds after it was submitted, on the clock's scheduler.
-    Exchange After(std::uint64_t microseconds) const;
-    /// Completes when the test says so (`CompleteNext`), or never.
-    Exchange OnDemand() const;
+    Exchange After(std::uint64_t microseconds) const { return With(&Exchange::delay, microseconds); }
+    /// Is left to its cancellation.
+    Exchange OnDemand() const { return With(&Exchange::delay, Never); }
     /// A cancellation finds that many bytes moved.
-    Exchange MovesWhenCancelled(std::uint32_t bytes) const;
+    Exchange MovesWhenCancelled(std::uint32_t bytes) const {
+        return With(&Exchange::movedWhenCancelled, bytes);
+    }
 
-    bool IsIn() const;
+    bool IsIn() const { return endpoint == 0 ? setup.IsIn() : (endpoint & 0x80) != 0; }
     std::string Describe() const;
+
+  private:
+    template <class Value>
+    Exchange With(Value Exchange::*member, Value value) const {
+        Exchange row = *this;
+        row.*member = value;
+        return row;
+    }
 };
 
 Exchange VendorOut(std::uint8_t request, Bytes data, std::uint16_t value = 0, std::uint16_t index = 0);

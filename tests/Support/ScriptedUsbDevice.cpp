@@ -13,15 +13,18 @@ using Platform::Usb::Transfer;
 using Platform::Usb::TransferStatus;
 namespace Errors = Platform::Errors;
 
-ScriptedUsbDevice::ScriptedUsbDevice(std::vector<Exchange> rows, Pace pace)
-    : script(std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end())), defaultPace(pace) {}
+ScriptedUsbDevice::ScriptedUsbDevice(std::vector<Exchange> rows)
+    : script(std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end())) {}
 
 ScriptedUsbDevice::~ScriptedUsbDevice() {
     for (const std::uint64_t event : events) {
         Platform::ClockScheduler().Forget(event);
     }
     Unplug();
-    ExpectFinished();
+    if (!script.empty() && !failed) {
+        ADD_FAILURE() << script.size() << " rows of the script were not played; the next, row " << played
+                      << ":\n  expected: " << script.front().Describe();
+    }
 }
 
 void ScriptedUsbDevice::Expect(std::vector<Exchange> rows) {
@@ -29,32 +32,18 @@ void ScriptedUsbDevice::Expect(std::vector<Exchange> rows) {
     script.insert(script.end(), std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end()));
 }
 
-void ScriptedUsbDevice::ExpectFinished() {
-    const std::lock_guard guard(lock);
-    if (!script.empty() && !failed) {
-        failed = true;
-        ADD_FAILURE() << script.size() << " rows of the script were not played; the next, row " << played
-                      << ":\n  expected: " << script.front().Describe();
-    }
-}
-
 void ScriptedUsbDevice::LeaveToTest(std::uint8_t endpoint) {
     const std::lock_guard guard(lock);
     leftToTest.insert(endpoint);
 }
 
-ScriptedUsbDevice::Running* ScriptedUsbDevice::OldestWaiting(std::uint8_t endpoint) {
-    const auto oldest = std::ranges::find_if(running, [endpoint](const Running& candidate) {
-        return candidate.transfer->endpoint == endpoint && !candidate.ready;
-    });
-    return oldest == running.end() ? nullptr : &*oldest;
-}
-
 void ScriptedUsbDevice::Send(std::uint8_t endpoint, Bytes data) {
     {
         const std::lock_guard guard(lock);
-        Running* const oldest = OldestWaiting(endpoint);
-        if (!oldest) {
+        const auto oldest = std::ranges::find_if(running, [endpoint](const Running& candidate) {
+            return candidate.transfer->endpoint == endpoint && !candidate.ready;
+        });
+        if (oldest == running.end()) {
             unsent.emplace_back(endpoint, std::move(data));
             return;
         }
@@ -62,24 +51,6 @@ void ScriptedUsbDevice::Send(std::uint8_t endpoint, Bytes data) {
         oldest->ready = true;
     }
     CompleteReady(endpoint);
-}
-
-bool ScriptedUsbDevice::CompleteNext(std::uint8_t endpoint) {
-    {
-        const std::lock_guard guard(lock);
-        Running* const oldest = OldestWaiting(endpoint);
-        if (!oldest) {
-            return false;
-        }
-        oldest->ready = true;
-    }
-    CompleteReady(endpoint);
-    return true;
-}
-
-void ScriptedUsbDevice::CancelLater(bool later) {
-    const std::lock_guard guard(lock);
-    cancelLater = later;
 }
 
 void ScriptedUsbDevice::Unplug() {
@@ -93,31 +64,6 @@ void ScriptedUsbDevice::Unplug() {
         transfer.row = transfer.row.Ends(TransferStatus::DeviceGone);
         Finish(transfer);
     }
-}
-
-void ScriptedUsbDevice::AnswerClaim(ErrorCode code) {
-    const std::lock_guard guard(lock);
-    claimAnswer = code;
-}
-
-bool ScriptedUsbDevice::IsClaimed() const {
-    const std::lock_guard guard(lock);
-    return claimed;
-}
-
-bool ScriptedUsbDevice::IsOpen() const {
-    const std::lock_guard guard(lock);
-    return handles > 0;
-}
-
-std::uint32_t ScriptedUsbDevice::TimesOpened() const {
-    const std::lock_guard guard(lock);
-    return timesOpened;
-}
-
-std::uint32_t ScriptedUsbDevice::TimesClaimed() const {
-    const std::lock_guard guard(lock);
-    return timesClaimed;
 }
 
 std::size_t ScriptedUsbDevice::Pending(std::uint8_t endpoint) const {
@@ -158,15 +104,14 @@ ErrorCode ScriptedUsbDevice::Submit(Transfer& transfer) {
         }
         number = ++lastNumber;
         Running submitted{number, &transfer, {}, false, false};
-        Exchange::When when = Exchange::When::AtOnce;
         if (leftToTest.contains(endpoint)) {
             const auto waiting =
                 std::ranges::find(unsent, endpoint, [](const auto& sent) { return sent.first; });
-            when = Exchange::When::OnDemand;
-            if (waiting != unsent.end()) {
+            if (waiting == unsent.end()) {
+                delay = Exchange::Never;
+            } else {
                 submitted.row = BulkIn(transfer.length, std::move(waiting->second), endpoint);
                 unsent.erase(waiting);
-                when = Exchange::When::AtOnce;
             }
         } else if (script.empty() || !Matches(script.front(), transfer)) {
             Mismatch(Describe(transfer));
@@ -178,26 +123,14 @@ ErrorCode ScriptedUsbDevice::Submit(Transfer& transfer) {
             if (submitted.row.refusal != Errors::Success) {
                 return submitted.row.refusal;
             }
-            when = submitted.row.when;
             delay = submitted.row.delay;
-            if (when == Exchange::When::AsPaced) {
-                when = defaultPace == Pace::AtOnce  ? Exchange::When::AtOnce
-                       : defaultPace == Pace::Later ? Exchange::When::Later
-                                                    : Exchange::When::OnDemand;
-            }
         }
-        submitted.ready = when == Exchange::When::AtOnce;
+        submitted.ready = delay == 0;
         running.push_back(std::move(submitted));
-        if (when == Exchange::When::OnDemand) {
-            return Errors::Success;
-        }
-        if (when == Exchange::When::AtOnce) {
-            number = 0;
-        }
     }
-    if (number == 0) {
+    if (delay == 0) {
         CompleteReady(endpoint);
-    } else {
+    } else if (delay != Exchange::Never) {
         CompleteLater(number, delay);
     }
     return Errors::Success;

@@ -20,38 +20,27 @@ namespace Varnholt::Tests {
 /// operations may be called from any thread. A device that the test has unplugged refuses everything.
 class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
   public:
-    /// How rows complete that do not say it themselves.
-    enum class Pace {
-        AtOnce,    ///< inside `Submit`
-        Later,     ///< on the clock's scheduler, as soon as it runs
-        OnDemand,  ///< when the test says so
-    };
-
-    explicit ScriptedUsbDevice(std::vector<Exchange> rows = {}, Pace pace = Pace::AtOnce);
+    explicit ScriptedUsbDevice(std::vector<Exchange> rows = {});
     /// Fails the test if rows are left.
     ~ScriptedUsbDevice() override;
 
     /// Appends rows.
     void Expect(std::vector<Exchange> rows);
-    /// Fails the test unless every row was played.
-    void ExpectFinished();
     /// Transfers on this endpoint are no rows: they stay pending until `Send`, a cancellation or the end.
     void LeaveToTest(std::uint8_t endpoint);
     /// Answers the oldest transfer on an endpoint left to the test, or the next one.
     void Send(std::uint8_t endpoint, Bytes data);
-    /// Completes the oldest pending transfer of the endpoint; false if there is none.
-    bool CompleteNext(std::uint8_t endpoint);
     /// Cancellations complete later, on the clock's scheduler, instead of inside `Cancel`.
-    void CancelLater(bool later);
+    void CancelLater(bool later) { Set(cancelLater, later); }
     /// Pending transfers end with `DeviceGone`; nothing is accepted any more.
     void Unplug();
     /// What `Claim` answers from now on.
-    void AnswerClaim(Platform::ErrorCode code);
+    void AnswerClaim(Platform::ErrorCode code) { Set(claimAnswer, code); }
 
-    bool IsClaimed() const;
-    bool IsOpen() const;
-    std::uint32_t TimesOpened() const;
-    std::uint32_t TimesClaimed() const;
+    bool IsClaimed() const { return Get(claimed); }
+    bool IsOpen() const { return Get(handles) > 0; }
+    std::uint32_t TimesOpened() const { return Get(timesOpened); }
+    std::uint32_t TimesClaimed() const { return Get(timesClaimed); }
     std::size_t Pending(std::uint8_t endpoint) const;
 
     std::vector<Platform::Usb::EndpointInfo> Endpoints() override;
@@ -74,7 +63,16 @@ class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
         bool cancelled;  ///< completes out of order
     };
 
-    Running* OldestWaiting(std::uint8_t endpoint);
+    template <class Value>
+    Value Get(const Value& member) const {
+        const std::lock_guard guard(lock);
+        return member;
+    }
+    template <class Value>
+    void Set(Value& member, Value value) {
+        const std::lock_guard guard(lock);
+        member = value;
+    }
     bool Matches(const Exchange& row, const Platform::Usb::Transfer& transfer) const;
     void Mismatch(const std::string& actual);
     void CompleteReady(std::uint8_t endpoint);
@@ -85,7 +83,6 @@ class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
     std::deque<Exchange> script;
     std::size_t played = 0;
     bool failed = false;
-    const Pace defaultPace;
     std::deque<Running> running;  // oldest first
     std::uint64_t lastNumber = 0;
     std::vector<std::uint64_t> events;
