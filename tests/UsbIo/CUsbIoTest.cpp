@@ -132,14 +132,8 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
     }
     const ScopedDeviceList list(InterfaceClass);
     EXPECT_EQ(CUsbIo().Open(0, list.Get(), nullptr), Status::InvalidFunctionParameter);
-}
-
-TEST_F(CUsbIoTest, DeviceListsAreMadeAndDestroyed) {
-    EXPECT_TRUE(CUsbIo::DestroyDeviceList(nullptr));
     EXPECT_EQ(CUsbIo::CreateDeviceList(nullptr), nullptr);
-    const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
-    ASSERT_NE(list, nullptr);
-    EXPECT_TRUE(CUsbIo::DestroyDeviceList(list));
+    EXPECT_TRUE(CUsbIo::DestroyDeviceList(nullptr));
 }
 
 TEST_F(CUsbIoTest, AClosedObjectTouchesNothing) {
@@ -205,25 +199,22 @@ TEST_F(CUsbIoTest, SendsTheDriversRecords) {
 }
 
 TEST_F(CUsbIoTest, ControlsReportHowTheyEnd) {
-    struct Case {
+    constexpr std::uint32_t Bad = Status::DeviceRemoved;
+    const struct {
         const char* name;
         Tests::Answer answer;
         std::uint32_t status;
         std::uint32_t moved;
-    };
-    const std::vector<Case> cases{
+    } cases[] = {
         {"at once", {.data = {1, 2}}, 0, 2},
         {"later", {.data = {1}, .after = 20}, 0, 1},
         {"refused", {.refusal = 170}, 170, 0},
-        {"fails at once", {.code = Status::NotConfigured}, Status::NotConfigured, 0},
-        {"fails later with data",
-         {.data = {1, 2, 3}, .code = Status::DeviceRemoved, .after = 20},
-         Status::DeviceRemoved,
-         3},
+        {"fails at once", {.code = Bad}, Bad, 0},
+        {"fails later with data", {.data = {1, 2, 3}, .code = Bad, .after = 20}, Bad, 3},
     };
     CUsbIo device;
     ASSERT_EQ(Open(device), Status::Success);
-    for (const Case& row : cases) {
+    for (const auto& row : cases) {
         driver.Script(Control::ClassOrVendorInRequest, row.answer);
         std::array<std::uint8_t, 4> data{};
         std::uint32_t length = data.size();

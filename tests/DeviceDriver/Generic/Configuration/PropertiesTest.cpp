@@ -40,16 +40,6 @@ TEST(Properties, RefuseAnAbsentIdentifierByItsNumber) {
     EXPECT_EQ(Properties::GetExceptionText(1234), "Requested data is not available (ID 1234)");
 }
 
-TEST(Properties, CopiesAreIndependent) {
-    Properties set;
-    set.SetProperty(1, Long(1));
-    Properties copy = set;
-    copy.GetProperty(1).Assign(std::int32_t{2});
-    copy.SetName("copy");
-    EXPECT_EQ(set.GetProperty(1).AsLong(), 1);
-    EXPECT_EQ(set.GetName(), "");
-}
-
 TEST(Properties, DumpIsAStreamOfValuesWithOrWithoutIdentifiers) {
     Properties set;
     set.SetProperty(258, Long(1));
@@ -80,14 +70,6 @@ TEST(Properties, DumpIsAStreamOfValuesWithOrWithoutIdentifiers) {
             set.Dump(shorter.begin(), shorter.end(), row.valuesOnly, row.bigEndian);
         });
         EXPECT_EQ(shorter, Bytes(row.expected.size() - 1, 0xAA)) << "nothing may be written";
-    }
-}
-
-TEST(Properties, EmptyCollectionDumpsNothing) {
-    Bytes none;
-    for (const bool valuesOnly : {false, true}) {
-        EXPECT_EQ(Properties().SizeOf(valuesOnly), 0U);
-        Properties().Dump(none.begin(), none.end(), valuesOnly, true);
     }
 }
 

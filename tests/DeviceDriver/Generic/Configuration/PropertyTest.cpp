@@ -37,12 +37,7 @@ const std::vector<Case>& Cases() {
         {"16 bits extended", Property(std::int16_t{-2}), TypeLong, {-2}, {}, {0xFF, 0xFF, 0xFF, 0xFE}},
         {"32 bits", Property(std::int32_t{0x01020304}), TypeLong, {0x01020304}, {}, {1, 2, 3, 4}},
         {"float", Property(1.0F), TypeFloat, {}, {1.0F}, {0x3F, 0x80, 0, 0}},
-        {"integers",
-         Property(Longs{1, -1}),
-         TypeLongVector,
-         {1, -1},
-         {},
-         {0, 0, 0, 1, 0xFF, 0xFF, 0xFF, 0xFF}},
+        {"integers", Property(Longs{1, -1}), TypeLongVector, {1, -1}, {}, {0, 0, 0, 1, 255, 255, 255, 255}},
         {"floats", Property(Floats{-2.0F}), TypeFloatVector, {}, {-2.0F}, {0xC0, 0, 0, 0}},
         {"no integers", Property(Longs{}), TypeLongVector, {}, {}, {}},
     };
@@ -69,18 +64,16 @@ TEST(Property, ConstructionFixesTypeAndBytes) {
 TEST(Property, AssigningReplacesTypeAndValueWhateverWasThere) {
     for (const Case& before : Cases()) {
         SCOPED_TRACE(before.name);
-        Property value = before.value;
-        ExpectHolds(value.Assign(std::int8_t{-3}), Cases()[1]);
-        value = before.value;
-        ExpectHolds(value.Assign(std::int16_t{-2}), Cases()[2]);
-        value = before.value;
-        ExpectHolds(value.Assign(std::int32_t{0x01020304}), Cases()[3]);
-        value = before.value;
-        ExpectHolds(value.Assign(1.0F), Cases()[4]);
-        value = before.value;
-        ExpectHolds(value.Assign(Longs{1, -1}), Cases()[5]);
-        value = before.value;
-        ExpectHolds(value.Assign(Floats{-2.0F}), Cases()[6]);
+        const auto expect = [&](std::size_t row, const auto& assigned) {
+            Property value = before.value;
+            ExpectHolds(value.Assign(assigned), Cases()[row]);
+        };
+        expect(1, std::int8_t{-3});
+        expect(2, std::int16_t{-2});
+        expect(3, std::int32_t{0x01020304});
+        expect(4, 1.0F);
+        expect(5, Longs{1, -1});
+        expect(6, Floats{-2.0F});
     }
 }
 
