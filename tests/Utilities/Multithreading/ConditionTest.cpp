@@ -71,9 +71,12 @@ class ConditionTest : public testing::Test {
         return false;
     }
 
-    int Woken() {
+    /// So many wake up, and no more a little later.
+    void ExpectWoken(int count) {
+        Await([this, count] { return woken == count; });
+        std::this_thread::sleep_for(ALittle);
         const ScopedLock lock(mutex);
-        return woken;
+        EXPECT_EQ(woken, count);
     }
 
     /// Makes a call fail, on this thread only when others are in the middle of theirs.
@@ -99,13 +102,10 @@ TEST_F(ConditionTest, SignalWakesOneAndIsForgottenWithoutAWaiter) {
     condition.signal();
     condition.broadcast();
     StartWaiters(3);
-    for (int expected = 0; expected <= 3; ++expected) {
-        if (expected > 0) {
-            condition.signal();
-        }
-        Await([&] { return woken == expected; });
-        std::this_thread::sleep_for(ALittle);
-        EXPECT_EQ(Woken(), expected);
+    ExpectWoken(0);
+    for (int expected = 1; expected <= 3; ++expected) {
+        condition.signal();
+        ExpectWoken(expected);
     }
 }
 
@@ -120,14 +120,11 @@ TEST_F(ConditionTest, BroadcastReturnsWhenAllHaveLeftAndLeavesNothingBehind) {
         Await([&] { return woken == 3 * round; });
     }
     StartWaiters(2);
-    std::this_thread::sleep_for(ALittle);
-    EXPECT_EQ(Woken(), 6) << "no wake-up may be left over";
+    ExpectWoken(6);  // no wake-up is left over
     condition.signal();
-    Await([this] { return woken == 7; });
-    std::this_thread::sleep_for(ALittle);
-    EXPECT_EQ(Woken(), 7) << "a signal must not pass for a broadcast";
+    ExpectWoken(7);  // nor did the signal pass for a broadcast
     condition.broadcast();
-    Await([this] { return woken == 8; });
+    ExpectWoken(8);
 }
 
 TEST_F(ConditionTest, NeedsAMutexWithAName) {
@@ -167,14 +164,12 @@ TEST_F(ConditionTest, FailedReleaseUnlocksTheMutexAndKeepsNothingLocked) {
             EXPECT_TRUE(mutex.TryLock(1000)) << "must have been unlocked";
             mutex.Unlock();
         }).join();
-        EXPECT_EQ(Woken(), 0);
     }
+    ExpectWoken(0);
     std::thread([this] { condition.signal(); }).join();  // another thread gets into the state's own lock
-    Await([this] { return woken == 1; });
-    std::this_thread::sleep_for(ALittle);
-    EXPECT_EQ(Woken(), 1);
+    ExpectWoken(1);
     condition.broadcast();
-    Await([this] { return woken == 2; });
+    ExpectWoken(2);
 }
 
 TEST_F(ConditionTest, BroadcastReportsAnEventItCannotWaitFor) {
