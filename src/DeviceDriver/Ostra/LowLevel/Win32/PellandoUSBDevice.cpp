@@ -8,10 +8,10 @@
 #include <utility>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/WaitLimit.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/NativeDeviceList.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/StripReader.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
-#include "DeviceDriver/Ostra/LowLevel/Win32/WaitLimit.h"
 #include "Platform/Time.h"
 #include "Platform/WaitableObjects.h"
 #include "Protocol/ByteOrder.h"
@@ -29,6 +29,7 @@ using Generic::Utilities::IOException;
 using Generic::Utilities::TimeoutException;
 using Platform::WaitResult;
 using Varnholt::Utilities::Exceptions::Here;
+using Varnholt::Utilities::Exceptions::SourceLocation;
 using Varnholt::Utilities::Multithreading::Mutex;
 using Varnholt::Utilities::Multithreading::ScopedLock;
 
@@ -49,12 +50,12 @@ NativeDriver::ControlBlock MakeBlock(std::uint8_t type, std::uint8_t request, st
     return block;
 }
 
-std::uint32_t ChunkSize(std::uint32_t recordSize) {
+std::uint32_t ChunkSize(std::uint32_t recordSize, const SourceLocation& caller = SourceLocation::current()) {
     if (recordSize > MaximumChunk / RecordsPerChunk) {
-        throw IOException("Max packages size is 65535", Here());
+        throw IOException("Max packages size is 65535", Here(caller));
     }
     if (recordSize == 0) {
-        throw IOException("Record size must not be 0", Here());
+        throw IOException("Record size must not be 0", Here(caller));
     }
     return recordSize * RecordsPerChunk;
 }
@@ -82,11 +83,12 @@ class PellandoUSBDevice::Core final : public EventListener {
 
     void MessageFromDevice(std::uint32_t code, std::uint32_t parameter) override {
         const ScopedLock held(lock);
-        if (!listener || isClosed) {
+        const bool isGone = code == Generic::MessageDeviceGone;
+        if (!listener || isClosed || (isGone && isClosing)) {
             return;
         }
         listener->MessageFromDevice(code, parameter);
-        if (code == Generic::MessageDeviceGone) {
+        if (listener && isGone) {
             const Platform::CriticalSection::Holder closing(closingLock);
             ClosePipes();
         }
@@ -106,13 +108,20 @@ class PellandoUSBDevice::Core final : public EventListener {
     USBConnection write;
     /// Keeps the pipes open for the controls that are sent without the device lock.
     Platform::CriticalSection closingLock;
+    /// Closing ends the read of the interrupt pipe, which looks as if the instrument had gone.
+    std::atomic<bool> isClosing = false;
     std::atomic<bool> isClosed = false;
 };
 
 PellandoUSBDevice::PellandoUSBDevice(EventListener* listener, const std::string& devicePath) try
     : core(std::make_shared<Core>(listener, devicePath)), interruptListener(devicePath) {
-    const ScopedLock held(core->lock);
-    SetupInterruptListener();
+    try {
+        const ScopedLock held(core->lock);
+        SetupInterruptListener();
+    } catch (...) {
+        core->isClosed = true;  // a message may be on its way to the listener of an owner that gets no device
+        throw;
+    }
 }
 TRACED
 
@@ -132,6 +141,7 @@ void PellandoUSBDevice::SetupInterruptListener() try {
 TRACED
 
 void PellandoUSBDevice::Shutdown() try {
+    core->isClosing = true;
     HandleUntouchedButton();
     interruptListener.Stop();
 }
@@ -213,7 +223,7 @@ void PellandoUSBDevice::ReadDataStrip(ScanRecordList& records, std::uint32_t rec
         if (!reader.HasSucceeded()) {
             throw IOException("Read data failed (OverlappedRead)", Here());
         }
-        if (reader.Count() % recordSize != 0) {
+        if (reader.Count() % recordSize != 0 || reader.Count() > reader.SizeAsked()) {
             throw IOException("Read data failed (wrong data size)", Here());
         }
         hasEnded = reader.Count() != reader.SizeAsked();

@@ -1,4 +1,5 @@
 #include <functional>
+#include <optional>
 
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
 #include "NativeTest.h"
@@ -61,6 +62,12 @@ struct Brought {
         failing.code = code;
         return failing;
     }
+    /// A driver that claims more than there can be.
+    static Brought Claiming(std::size_t bytes, std::uint32_t claimed) {
+        Brought claiming(bytes);
+        claiming.claimed = claimed;
+        return claiming;
+    }
     static Brought Refused() {
         Brought refused(0);
         refused.refusal = Errors::DeviceNotConnected;
@@ -70,6 +77,7 @@ struct Brought {
     std::size_t count;
     std::uint32_t after;
     ErrorCode code = Errors::Success, refusal = Errors::Success;
+    std::optional<std::uint32_t> claimed{};
 };
 const Brought Gone = Brought::Failing(Errors::DeviceNotConnected);
 
@@ -109,6 +117,8 @@ const StripCase StripCases[] = {
     {"fails with one that does not start", 5, 0, {10, Brought::Refused()}, "10 50 50 x", 10, Failed},
     {"refuses broken records", 5, 0, {10, 49}, "10 50 50 x", 10, WrongSize},
     {"refuses a broken first record", 5, 0, {4}, "10 50 x", 0, WrongSize},
+    {"refuses more than was asked", 5, 0, {10, Brought::Claiming(50, 60)}, "10 50 50 x", 10, WrongSize},
+    {"refuses more than was asked at first", 5, 0, {Brought::Claiming(10, 50)}, "10 50 x", 0, WrongSize},
     {"largest record", 6553, 0, {6553}, "13106 65530 65530 x", 6553},
     {"too large a record", 6554, 0, {}, "", 0, TooLarge},
     {"record size that wraps", 0x1999999A, 0, {}, "", 0, TooLarge},
@@ -136,8 +146,11 @@ TEST_F(NativeStripRead, SizesAndEndings) {
         Bytes sent;
         for (const Brought& read : row.brought) {
             const Bytes data = Counting(read.count, static_cast<unsigned>(sent.size()));
-            driver.Script(ReadPipe,
-                          {.data = data, .code = read.code, .after = read.after, .refusal = read.refusal});
+            driver.Script(ReadPipe, {.data = data,
+                                     .code = read.code,
+                                     .after = read.after,
+                                     .count = read.claimed,
+                                     .refusal = read.refusal});
             sent.insert(sent.end(), data.begin(), data.end());
         }
         sent.resize(row.bytesKept);
