@@ -146,14 +146,14 @@ void PellandoEAT::EnsureConsistency(const Properties& set) try {
 }
 TRACED
 
-void PellandoEAT::EnsureConsistency(const PellandoLog& log) try {
-    const Properties& set = log.GetItems();
+void PellandoEAT::EnsureConsistency(const PellandoLog& log) try { EnsureConsistency(log.GetItems()); }
+TRACED
+
+void PellandoEAT::FitSection(const Properties& set, std::uint16_t idOffset) try {
     Backup before;
     try {
-        MoveFor(set, 0, before);
-        if (Holds(set, EepromMap::LogCopyIdOffset)) {
-            MoveFor(set, EepromMap::LogCopyIdOffset, before);
-        }
+        MoveFor(set, idOffset, before);
+        MoveSectionEnd(set, idOffset, before);
     } catch (...) {
         Restore(before);
         throw;
@@ -169,34 +169,38 @@ void PellandoEAT::Restore(Backup& before) {
 
 void PellandoEAT::MoveFor(const Properties& set, std::uint16_t idOffset, Backup& before) {
     const auto& values = set.GetDatastore();
-    if (values.empty()) {
-        return;
-    }
-    const auto& entries = datastore.GetDatastore();
-    const auto last = Find(entries, WithOffset(values.back().first, idOffset));
-    const auto behind = last == entries.end() ? last : std::next(last);
-    const bool endMoves = behind != entries.end() && IsSectionEnd(behind->first);
     for (auto value = values.begin(); value != values.end(); ++value) {
         const std::int64_t difference =
             static_cast<std::int64_t>(value->second.SizeOf()) - SizeOf(WithOffset(value->first, idOffset));
         if (difference == 0) {
             continue;
         }
-        if (!before) {
-            before = datastore;
-        }
         for (auto later = std::next(value); later != values.end(); ++later) {
-            Move(WithOffset(later->first, idOffset), difference);
-        }
-        if (endMoves) {
-            Move(behind->first, difference);
+            const std::uint16_t id = WithOffset(later->first, idOffset);
+            MoveTo(id, AddressOf(id) + difference, before);
         }
     }
 }
 
-void PellandoEAT::Move(std::uint16_t id, std::int64_t difference) {
-    Property& address = datastore.GetProperty(id);
-    address.Assign(To32Bits(address.AsLong() + difference));
+void PellandoEAT::MoveSectionEnd(const Properties& set, std::uint16_t idOffset, Backup& before) {
+    if (set.GetDatastore().empty()) {
+        return;
+    }
+    const auto& [lastId, lastValue] = set.GetDatastore().back();
+    const auto& entries = datastore.GetDatastore();
+    const auto last = Find(entries, WithOffset(lastId, idOffset));
+    const auto behind = last == entries.end() ? last : std::next(last);
+    if (behind != entries.end() && IsSectionEnd(behind->first)) {
+        MoveTo(behind->first,
+               std::int64_t{last->second.AsLong()} + static_cast<std::int64_t>(lastValue.SizeOf()), before);
+    }
+}
+
+void PellandoEAT::MoveTo(std::uint16_t id, std::int64_t address, Backup& before) {
+    if (!before) {
+        before = datastore;
+    }
+    datastore.GetProperty(id).Assign(To32Bits(address));
 }
 
 bool PellandoEAT::Holds(const Properties& set, std::uint16_t idOffset) const {

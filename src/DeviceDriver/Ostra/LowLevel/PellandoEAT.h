@@ -44,15 +44,16 @@ class PellandoEAT final {
     /// Whether `count` bytes from the entry's address end before address 4096.
     bool IsEntryInLogArea(std::uint16_t id, std::uint32_t count) const;
 
-    /// Makes room for values whose size has changed, so that an image that is dumped afterwards can be read
-    /// back: behind each such value the set's later identifiers move by the difference, and with them the
-    /// section end that follows the set's last identifier in the table. Were the end left behind, the last
-    /// value of the section would be read back with a wrong size. Nothing else moves, and the order stays. A
-    /// failure (an identifier that the table lacks) restores the table.
+    /// Makes room for values whose size has changed: behind each such value the set's later identifiers move
+    /// by the difference. Nothing else moves, and the order stays. A failure (an identifier that the table
+    /// lacks) restores the table.
     void EnsureConsistency(const Properties& set);
-    /// The same for the log, and for its second copy where the table has one, because both are dumped in the
-    /// same form.
     void EnsureConsistency(const PellandoLog& log);
+    /// Makes the table fit an image in which the values of `set`, under their identifiers plus `idOffset`,
+    /// lie one behind the other: moves what `EnsureConsistency` moves, which knows no offset, and the section
+    /// end that follows the set's last identifier in the table. Were the end left behind, the last value
+    /// would be read back with a wrong size. A failure restores the table.
+    void FitSection(const Properties& set, std::uint16_t idOffset);
 
     /// Whether the table has every identifier of `set`, plus `idOffset`.
     bool Holds(const Properties& set, std::uint16_t idOffset) const;
@@ -84,7 +85,8 @@ class PellandoEAT final {
     /// there is none.
     using Backup = std::optional<Properties>;
     void MoveFor(const Properties& set, std::uint16_t idOffset, Backup& before);
-    void Move(std::uint16_t id, std::int64_t difference);
+    void MoveSectionEnd(const Properties& set, std::uint16_t idOffset, Backup& before);
+    void MoveTo(std::uint16_t id, std::int64_t address, Backup& before);
     void Restore(Backup& before);
 
     std::uint16_t version = 0;

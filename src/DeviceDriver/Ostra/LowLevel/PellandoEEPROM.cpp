@@ -56,6 +56,13 @@ Bytes Joined(Bytes first, const Bytes& second) {
     return first;
 }
 
+/// Whether the table finds both copies of the log where they are dumped.
+bool LocatesLog(const PellandoEAT& table, const Properties& items) {
+    return table.Locates(items, EepromMap::MainLog, 0) &&
+           (!table.Holds(items, EepromMap::LogCopyIdOffset) ||
+            table.Locates(items, EepromMap::LogCopy, EepromMap::LogCopyIdOffset));
+}
+
 bool IsRequested(const Properties& set, std::uint16_t request) {
     return set.Contains(request) && set.GetProperty(request).AsLong() == 1;
 }
@@ -68,6 +75,7 @@ PellandoEEPROM::PellandoEEPROM(const SmartPointer<PellandoFunctionality>& instru
     const Bytes second = Read(*functionality, HalfSize, HalfSize);
     const Bytes image = Joined(std::move(first), second);
     eat = SmartPointer<PellandoEAT>(new PellandoEAT(image.begin() + EepromMap::Table));
+    storedTable = SmartPointer<PellandoEAT>(new PellandoEAT(image.begin() + EepromMap::Table));
     log = SmartPointer<PellandoLog>(new PellandoLog(*eat, image.begin()));
     SetupCalibrationData(image);
 }
@@ -221,14 +229,16 @@ TRACED
 
 Bytes PellandoEEPROM::Dump() try {
     eat->EnsureConsistency(calibration);
+    eat->FitSection(calibration, 0);
     PellandoLog& currentLog = GetLog(true);
     currentLog.UpdateChecksum();  // which decides the checksum item's size
     eat->EnsureConsistency(currentLog);
     const Properties& items = currentLog.GetItems();
-    if (!eat->Locates(items, EepromMap::MainLog, 0) ||
-        !eat->Locates(calibration, EepromMap::Calibration, 0) ||
-        (eat->Holds(items, EepromMap::LogCopyIdOffset) &&
-         !eat->Locates(items, EepromMap::LogCopy, EepromMap::LogCopyIdOffset))) {
+    eat->FitSection(items, 0);
+    if (eat->Holds(items, EepromMap::LogCopyIdOffset)) {
+        eat->FitSection(items, EepromMap::LogCopyIdOffset);
+    }
+    if (!LocatesLog(*eat, items) || !eat->Locates(calibration, EepromMap::Calibration, 0)) {
         throw DataException(PellandoEAT::CorruptTable, Here());
     }
     Bytes image(Protocol::EepromSize, UnusedByte);
@@ -271,8 +281,13 @@ void PellandoEEPROM::WriteThrough() try {
 TRACED
 
 void PellandoEEPROM::DumpLog() try {
+    log->UpdateChecksum();  // which decides the checksum item's size
     Bytes bytes(std::min<std::size_t>(log->SizeOf(), EepromMap::LogArea));
     log->Dump(bytes.begin(), bytes.end());
+    if (!LocatesLog(*storedTable, log->GetItems())) {
+        // The values would be read back as others, and what lies behind the log would be overwritten.
+        throw DataException(PellandoEAT::CorruptTable, Here());
+    }
     functionality->WriteEEPROM(EepromMap::MainLog, bytes);
     functionality->WriteEEPROM(EepromMap::LogCopy, bytes);
 }

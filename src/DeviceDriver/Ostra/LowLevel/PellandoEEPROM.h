@@ -72,7 +72,8 @@ class PellandoEEPROM {
     void ThrowIfLocked() const;
     void WriteThrough();
     /// Writes the log to both its places, the main copy first. After a failure in the first write the second
-    /// copy is the old one. A log that would reach beyond its area is refused before anything is written.
+    /// copy is the old one. A log that would reach beyond its area (`ResourceException`) or that does not
+    /// lie there as the instrument's table says (`DataException`) is refused before anything is written.
     void DumpLog();
 
     /// Reads the calibration values out of an image of 8192 bytes.
@@ -91,6 +92,8 @@ class PellandoEEPROM {
     bool locked = true;
     Varnholt::Utilities::Tools::SmartPointer<PellandoLog> log;
     Varnholt::Utilities::Tools::SmartPointer<PellandoEAT> eat;
+    /// As the instrument has it, whatever `Dump` makes of the other: what is written must fit this one.
+    Varnholt::Utilities::Tools::SmartPointer<PellandoEAT> storedTable;
     Properties calibration;
     LostLogHandler reportLostLog;
 };

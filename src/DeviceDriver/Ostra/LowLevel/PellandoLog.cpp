@@ -58,7 +58,7 @@ std::uint32_t PellandoLog::CalculateChecksum() const try {
         for (const std::int32_t element : value.AsLongVector()) {
             sum += static_cast<std::uint32_t>(element);
         }
-        for (const float element : value.AsFloatVector()) {
+        for (const float& element : value.AsFloatVector()) {  // a copy may change the pattern
             sum += std::bit_cast<std::uint32_t>(element);
         }
     }

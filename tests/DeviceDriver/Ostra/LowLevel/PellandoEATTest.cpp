@@ -1,6 +1,8 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <map>
+
 #include <utility>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
@@ -148,19 +150,46 @@ TEST(PellandoEAT, DefaultSetsHaveTheirSizesAndValues) {
     EXPECT_EQ(calibration.GetProperty(4000).AsLong(), -1);
 }
 
-/// Where things move to is seen in images that are read back (`EepromImages`).
-TEST_F(FreshTable, EnsureConsistencyFindsNothingToDoTwiceAndItsWayBack) {
+/// The entries whose addresses differ from those of a fresh table, with the difference.
+std::map<int, int> MovedEntries(const PellandoEAT& table) {
+    std::map<int, int> moved;
+    const Entries now = EntriesOf(table);
+    for (std::size_t i = 0; i < Fresh.size(); ++i) {
+        EXPECT_EQ(now[i].first, Fresh[i].first) << "the order must stay";
+        if (now[i].second != Fresh[i].second) {
+            moved[now[i].first] = now[i].second - Fresh[i].second;
+        }
+    }
+    return moved;
+}
+
+/// Where things move to in other cases is seen in images that are read back (`EepromImages`).
+TEST_F(FreshTable, EnsureConsistencyMovesTheSetAndFitSectionItsEnd) {
     Properties set = PellandoEAT::GetDefaultCalibrationData();
     set.SetProperty(3009, Property(Longs(3)));
-    set.SetProperty(3013, Property(Longs(0)));
+    std::map<int, int> moved{{3010, 4}, {3011, 4}, {3012, 4}, {3013, 4}};
     table.EnsureConsistency(set);
-    const Entries moved = EntriesOf(table);
-    EXPECT_EQ(moved[50], (Entries::value_type{3010, 4744}));
-    EXPECT_EQ(moved[54], (Entries::value_type{2, 4756})) << "what makes up for each other ends where it did";
+    EXPECT_EQ(MovedEntries(table), moved);
+    table.FitSection(set, 0);
+    moved[2] = 4;
+    EXPECT_EQ(MovedEntries(table), moved);
     table.EnsureConsistency(set);
-    EXPECT_EQ(EntriesOf(table), moved);
-    table.EnsureConsistency(PellandoEAT::GetDefaultCalibrationData());
-    EXPECT_EQ(EntriesOf(table), Fresh);
+    EXPECT_EQ(MovedEntries(table), moved) << "a second call must find nothing to do";
+    table.FitSection(PellandoEAT::GetDefaultCalibrationData(), 0);
+    EXPECT_EQ(EntriesOf(table), Fresh) << "and the way back must be open";
+}
+
+TEST_F(FreshTable, CopiesOfTheLogMoveEachForItself) {
+    const Bytes image = FreshImage();
+    PellandoLog log(table, image.begin());
+    log.SetItem(10012, Property(Longs{1, 2, 3}));
+    std::map<int, int> moved{{10013, 8}, {10020, 8}, {10021, 8}};
+    table.EnsureConsistency(log);
+    EXPECT_EQ(MovedEntries(table), moved);
+    table.FitSection(log.GetItems(), 0);
+    table.FitSection(log.GetItems(), 1000);
+    moved.insert({{1, 8}, {11013, 8}, {11020, 8}, {11021, 8}, {3, 8}});
+    EXPECT_EQ(MovedEntries(table), moved);
 }
 
 TEST_F(FreshTable, EnsureConsistencyThatFailsChangesNothing) {
@@ -169,6 +198,8 @@ TEST_F(FreshTable, EnsureConsistencyThatFailsChangesNothing) {
     set.SetProperty(1001, Property(Longs{1, 2, 3}));
     set.SetProperty(77, Property(std::int32_t{1}));
     ExpectThrow<ResourceException>("id 77 doesn't exist", [&] { table.EnsureConsistency(set); });
+    EXPECT_EQ(EntriesOf(table), Fresh);
+    ExpectThrow<ResourceException>("id 77 doesn't exist", [&] { table.FitSection(set, 0); });
     EXPECT_EQ(EntriesOf(table), Fresh);
 
     const Bytes image = FreshImage();

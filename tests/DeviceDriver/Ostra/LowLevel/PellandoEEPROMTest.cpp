@@ -338,5 +338,24 @@ TEST_F(EepromTest, LogThatOutgrowsItsAreaNeverReachesTheTable) {
     EXPECT_EQ(instrument.eeprom, FreshImage());
 }
 
+/// The binary block lies right behind the log, and the instrument's table knows nothing of another size.
+TEST_F(EepromTest, LogThatDoesNotFitTheInstrumentsTableStaysOffIt) {
+    Load();
+    std::string reason;
+    eeprom->ReportLostLog([&](const std::string& text) { reason = text; });
+    eeprom->SetProperty(10012, Property(Longs{1, 2, 3}));
+    ExpectThrow<DataException>("corrupt EAT detected!!", [&] { eeprom->DumpLog(); });
+    EXPECT_NO_THROW(eeprom->Dump()) << "an image has a table of its own";
+    eeprom.reset();
+    EXPECT_EQ(reason, "corrupt EAT detected!!");
+    EXPECT_EQ(instrument.eeprom, FreshImage());
+
+    Load();
+    eeprom->SetProperty(10000, Property(Longs{1, 2}));
+    EXPECT_NO_THROW(eeprom->DumpLog()) << "the checksum is one value again by then";
+    eeprom.reset();
+    EXPECT_EQ(instrument.eeprom, FreshImage());
+}
+
 }  // namespace
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel
