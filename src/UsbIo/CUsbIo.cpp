@@ -6,6 +6,7 @@
 #include <string>
 
 #include "Platform/DeviceFiles.h"
+#include "UsbIo/FailureCode.h"
 #include "UsbIo/StatusTexts.h"
 
 namespace Varnholt::UsbIo {
@@ -18,12 +19,6 @@ using Platform::ErrorCode;
 namespace {
 
 constexpr std::uint16_t FirstInterfaceVersionBeyond = (InterfaceVersion & 0xFF00) + 0x0100;
-
-/// The code of the platform call that has just failed; never success, whatever the platform left behind.
-ErrorCode FailureCode() {
-    const ErrorCode code = Platform::LastError();
-    return code == Platform::Errors::Success ? Status::Failed : code;
-}
 
 }  // namespace
 

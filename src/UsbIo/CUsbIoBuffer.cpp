@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <new>
 
+#include "UsbIo/FailureCode.h"
+
 namespace Varnholt::UsbIo {
 
 using namespace Platform;
@@ -38,12 +40,12 @@ bool CUsbIoBuffer::Start(Handle file, Direction direction) {
         Collect();
         return Status == Errors::Success || IsPending();
     }
-    Status = LastError();
+    Status = FailureCode();
     return IsPending();
 }
 
 void CUsbIoBuffer::Collect() {
-    Status = request.GetResult(BytesTransferred) ? Errors::Success : LastError();
+    Status = request.GetResult(BytesTransferred) ? Errors::Success : FailureCode();
     if (Status == Errors::IoIncomplete) {
         Status = Errors::IoPending;
     }

@@ -1,5 +1,7 @@
 #include "UsbIo/CUsbIoReader.h"
 
+#include <utility>
+
 namespace Varnholt::UsbIo {
 
 void CUsbIoReader::ThreadRoutine() {
@@ -8,21 +10,19 @@ void CUsbIoReader::ThreadRoutine() {
     }
     errorCount = 0;
     while (!MustEnd()) {
-        while (CUsbIoBuffer* const buffer = BufferPool.Get()) {
+        while (HeldBuffer buffer = TakeFree()) {
             PrepareBuffer(*buffer);
             if (buffer->OperationFinished || buffer->NumberOfBytesToTransfer == 0) {
-                BufferPool.Put(buffer);
                 break;
             }
             Read(*buffer);  // a read that does not start is pending as a failed one
-            AppendPending(*buffer);
+            AppendPending(std::move(buffer));
         }
         if (!HasPending()) {
             break;
         }
-        CUsbIoBuffer& completed = TakeCompleted();
-        OnBufferCompleted(completed);
-        BufferPool.Put(&completed);
+        const HeldBuffer completed = TakeCompleted();
+        OnBufferCompleted(*completed);
     }
     DrainPending();
 }

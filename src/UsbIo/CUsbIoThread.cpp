@@ -59,11 +59,15 @@ std::uint32_t CUsbIoThread::ThreadProcedure(void* self) {
     Platform::SetCurrentThreadPriority(thread.ThreadPriority);
     try {
         thread.ThreadRoutine();
-        thread.OnThreadExit();
     } catch (...) {
         // The owner learns of it as of any end of the thread; the buffers must come to rest all the same.
         thread.CancelIo();
         thread.DrainPending();
+    }
+    try {
+        thread.OnThreadExit();
+    } catch (...) {
+        // There is nothing left to end.
     }
     const Platform::Handle handle = thread.threadHandle.exchange(NoHandle);
     if (handle != NoHandle) {
@@ -94,19 +98,20 @@ bool CUsbIoThread::MustEnd() const {
     return TerminateFlag || errorCount > MaxErrorCount;
 }
 
-void CUsbIoThread::AppendPending(CUsbIoBuffer& buffer) {
-    buffer.Next = nullptr;
-    (lastPending ? lastPending->Next : firstPending) = &buffer;
-    lastPending = &buffer;
+void CUsbIoThread::AppendPending(HeldBuffer buffer) {
+    CUsbIoBuffer* const pending = buffer.release();
+    pending->Next = nullptr;
+    (lastPending ? lastPending->Next : firstPending) = pending;
+    lastPending = pending;
 }
 
-CUsbIoBuffer& CUsbIoThread::RemoveFirstPending() {
-    CUsbIoBuffer& buffer = *firstPending;
-    firstPending = std::exchange(buffer.Next, nullptr);
+CUsbIoThread::HeldBuffer CUsbIoThread::RemoveFirstPending() {
+    CUsbIoBuffer* const buffer = firstPending;
+    firstPending = std::exchange(buffer->Next, nullptr);
     if (!firstPending) {
         lastPending = nullptr;
     }
-    return buffer;
+    return Hold(buffer);
 }
 
 void CUsbIoThread::WaitForFirstPending() {
@@ -118,7 +123,7 @@ void CUsbIoThread::WaitForFirstPending() {
     CancelToCompletion(*firstPending);  // where a wait was refused
 }
 
-CUsbIoBuffer& CUsbIoThread::TakeCompleted() {
+CUsbIoThread::HeldBuffer CUsbIoThread::TakeCompleted() {
     WaitForFirstPending();
     CUsbIoBuffer& buffer = *firstPending;
     if (buffer.Status == Status::Success) {
@@ -135,7 +140,7 @@ CUsbIoBuffer& CUsbIoThread::TakeCompleted() {
 void CUsbIoThread::DrainPending() {
     while (HasPending()) {
         WaitForFirstPending();
-        BufferPool.Put(&RemoveFirstPending());
+        RemoveFirstPending();
     }
 }
 

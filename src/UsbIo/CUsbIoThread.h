@@ -2,6 +2,7 @@
 
 #include <atomic>
 #include <cstdint>
+#include <memory>
 #include <thread>
 
 #include "Platform/Threads.h"
@@ -51,11 +52,19 @@ class CUsbIoThread : public CUsbIoPipe {
 
     /// The rest is for `ThreadRoutine`.
     bool MustEnd() const;
-    void AppendPending(CUsbIoBuffer& buffer);
+    /// A buffer that is in nobody's list goes back to the pool, also when a virtual operation throws.
+    struct PutBack {
+        CUsbIoBufferPool* pool;
+        void operator()(CUsbIoBuffer* buffer) const { pool->Put(buffer); }
+    };
+    using HeldBuffer = std::unique_ptr<CUsbIoBuffer, PutBack>;
+    /// Null when none is free.
+    HeldBuffer TakeFree() { return Hold(BufferPool.Get()); }
+    void AppendPending(HeldBuffer buffer);
     bool HasPending() const { return firstPending != nullptr; }
     /// Waits without limit for the first pending buffer, takes it off the list and counts and reports an
     /// error. The transfers of this thread are cancelled when `ShutdownThread` asks for the end meanwhile.
-    CUsbIoBuffer& TakeCompleted();
+    HeldBuffer TakeCompleted();
     /// Waits for all that is pending and puts it back into the pool.
     void DrainPending();
 
@@ -66,8 +75,9 @@ class CUsbIoThread : public CUsbIoPipe {
 
   private:
     static std::uint32_t ThreadProcedure(void* self);
+    HeldBuffer Hold(CUsbIoBuffer* buffer) { return HeldBuffer(buffer, PutBack{&BufferPool}); }
     void WaitForFirstPending();
-    CUsbIoBuffer& RemoveFirstPending();
+    HeldBuffer RemoveFirstPending();
 
     std::atomic<Platform::Handle> threadHandle = Platform::NoHandle;  ///< null while no thread runs
     std::atomic<std::thread::id> threadId;                            ///< of the running thread

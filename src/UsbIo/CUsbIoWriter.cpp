@@ -1,5 +1,7 @@
 #include "UsbIo/CUsbIoWriter.h"
 
+#include <utility>
+
 namespace Varnholt::UsbIo {
 
 void CUsbIoWriter::ThreadRoutine() {
@@ -9,20 +11,19 @@ void CUsbIoWriter::ThreadRoutine() {
     errorCount = 0;
     bool finished = false;
     while (!finished && !MustEnd()) {
-        while (CUsbIoBuffer* const buffer = BufferPool.Get()) {
+        while (HeldBuffer buffer = TakeFree()) {
             PrepareBuffer(*buffer);
             if (buffer->OperationFinished) {
-                BufferPool.Put(buffer);
                 finished = true;
                 break;
             }
             Write(*buffer);  // a write that does not start is pending as a failed one
-            AppendPending(*buffer);
+            AppendPending(std::move(buffer));
         }
         if (finished || !HasPending()) {
             break;
         }
-        BufferPool.Put(&TakeCompleted());
+        TakeCompleted();
     }
     DrainPending();
 }

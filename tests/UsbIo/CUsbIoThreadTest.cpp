@@ -206,6 +206,7 @@ TEST_F(CUsbIoThreadTest, SomethingThrownEndsTheThread) {
     ASSERT_TRUE(reader.StartThread());
     WaitUntil([&] { return !reader.Received().empty() && driver.Running(BulkInEndpoint) == 0; });
     EXPECT_TRUE(reader.ShutdownThread());
+    EXPECT_EQ(reader.FreeBufferCount(), 3U) << "also the one that was at hand";
 }
 
 TEST_F(CUsbIoThreadTest, WritesUntilFinished) {
