@@ -65,11 +65,17 @@ std::string QualifiedName(const char* signature) {
         text = text.substr(0, with);
     }
     // An operator's own symbol would unbalance the bracket count below: set it aside.
-    std::string_view symbol;
-    if (const std::size_t op = text.rfind("::operator"); op != std::string_view::npos) {
-        const std::size_t parameters = text.find('(', op + 2 + sizeof("operator") - 1);
+    constexpr std::string_view Operator = "::operator";
+    std::string symbol;
+    if (const std::size_t op = text.rfind(Operator); op != std::string_view::npos) {
+        const std::size_t symbolStart = op + Operator.size();
+        const bool isCall = text.substr(symbolStart, 2) == "()";
+        const std::size_t parameters = text.find('(', symbolStart + (isCall ? 2 : 0));
         if (parameters != std::string_view::npos) {
             symbol = text.substr(op, parameters - op);
+            if (symbol == "::operator->" || symbol == "::operator*") {
+                symbol.insert(Operator.size(), " ");  // as the locations of access operators have it
+            }
             text = text.substr(0, op);
         }
     } else if (const std::size_t parameters = StartOfParameterList(text);

