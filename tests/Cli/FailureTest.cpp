@@ -70,7 +70,7 @@ TEST(FailureTest, ASystemTextLosesItsLineBreak) {
 
 TEST(InstrumentNamesTest, ShortNames) {
     EXPECT_EQ(ShortNameOf("usbio/simulated-a"), "simulated-a");
-    EXPECT_EQ(ShortNameOf("native/usb-1-1.2"), "usb-1-1.2");
+    EXPECT_EQ(ShortNameOf("native/usb-1p1p2"), "usb-1p1p2");
     EXPECT_EQ(ShortNameOf(R"(\\?\usb#vid_1209&pid_0001#SIM0001#{00873fdf-61a8-11d1-aa5e-00c04fb1728b})"),
               "SIM0001");
     EXPECT_EQ(ShortNameOf(R"(\\?\odd)"), R"(\\?\odd)");

@@ -12,7 +12,7 @@ using testing::HasSubstr;
 
 Cli::DeviceFacts Plugged(const char* kernelDriver = "", bool isRegistered = true) {
     Cli::DeviceFacts facts;
-    facts.info = {.name = "usb-1-2",
+    facts.info = {.name = "usb-1p2",
                   .deviceNode = "/dev/bus/usb/001/007",
                   .systemPath = {},
                   .vendorId = "1209",
@@ -64,7 +64,7 @@ std::vector<Diagnosis> Diagnoses() {
         {"not registered",
          {{Plugged("", false)}, {}},
          problem,
-         "usb-1-2 (1209:0001, Meter)",
+         "usb-1p2 (1209:0001, Meter)",
          "sudo ostra register 1209:0001",
          ExitCode::NoInstrument},
         {"registered by mistake",

@@ -66,9 +66,17 @@ std::vector<unsigned> PortNumbers(std::string_view name) {
     return numbers;
 }
 
+/// The kernel's "1-1.2" as "usb-1p1p2". Between the numbers stand letters, because the name of an
+/// instrument's lock keeps only letters and digits: port 2 behind port 1 is not port 12.
+std::string NameOfPort(std::string port) {
+    std::ranges::replace_if(
+        port, [](char c) { return c == '-' || c == '.'; }, 'p');
+    return "usb-" + port;
+}
+
 UsbDeviceInfo Describe(udev_device* device) {
     UsbDeviceInfo info;
-    info.name = "usb-" + Text(udev_device_get_sysname(device));
+    info.name = NameOfPort(Text(udev_device_get_sysname(device)));
     info.deviceNode = Text(udev_device_get_devnode(device));
     info.systemPath = Text(udev_device_get_syspath(device));
     info.vendorId = Text(udev_device_get_sysattr_value(device, "idVendor"));

@@ -13,7 +13,7 @@ inline constexpr const char* InterfaceClassProperty = "OSTRA_INTERFACE_CLASS";
 
 /// A USB device as udev and sysfs show it.
 struct UsbDeviceInfo {
-    std::string name;          ///< "usb-1-1.2": where it is plugged in; survives replugging
+    std::string name;          ///< "usb-1p1p2": where it is plugged in; survives replugging
     std::string deviceNode;    ///< "/dev/bus/usb/001/005"
     std::string systemPath;    ///< its folder below /sys
     std::string vendorId;      ///< four hexadecimal digits
