@@ -6,8 +6,8 @@
 
 namespace Varnholt::Platform {
 
-/// The platform's record of its own version. On a platform other than Windows: an NT-family record that leads
-/// to a truthful text (see the implementation).
+/// The platform's record of its own version. On a platform other than Windows: a record of no family of
+/// Windows, which leads to a truthful text (see the implementation).
 struct VersionRecord {
     std::uint32_t platformId = 0;
     std::uint32_t major = 0;

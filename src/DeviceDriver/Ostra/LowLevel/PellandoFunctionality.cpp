@@ -41,7 +41,9 @@ std::uint16_t CheckedLength(std::size_t length) {
 }  // namespace
 
 PellandoFunctionality::PellandoFunctionality(Generic::EventListener* listener, std::uint32_t deviceIndex) try
-    : PellandoFunctionality(PellandoFunctionalityByte::Instance(listener, deviceIndex)) {}
+    : implementation(PellandoFunctionalityByte::Instance(listener, deviceIndex)) {
+    Reset(Protocol::OpeningResetCode);
+}
 TRACED
 
 PellandoFunctionality::PellandoFunctionality(

@@ -12,7 +12,8 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 /// gone.
 ///
 /// Takes no lock: an object and its copies serve one thread at a time. Failures are the exceptions of the
-/// transport (`IOException`, `TimeoutException`, `DataException`); nothing is retried.
+/// transport (`IOException`, `TimeoutException`, `DataException`), and `InvalidArgumentException` for data
+/// whose length no command can carry; nothing is retried.
 class PellandoFunctionality final {
   public:
     /// Opens the instrument with this index in the list of connected instruments and resets it. `listener` is

@@ -6,9 +6,9 @@
 #include <vector>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "DeviceDriver/Ostra/LowLevel/WaitLimit.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
-#include "DeviceDriver/Ostra/LowLevel/Win32/WaitLimit.h"
-#include "Platform/Threads.h"
+#include "Platform/ScopedThreadPriority.h"
 #include "Protocol/ByteOrder.h"
 #include "Utilities/Exceptions/Location.h"
 #include "Utilities/Exceptions/Trace.h"
@@ -21,20 +21,6 @@ using Protocol::Request;
 using Varnholt::Utilities::Exceptions::Here;
 
 namespace {
-
-/// A strip read must have its next read queued in time: its thread goes before others while it runs.
-class RaisedPriority final {
-  public:
-    RaisedPriority() : before(Platform::CurrentThreadPriority()) {
-        Platform::SetCurrentThreadPriority(Platform::HighestThreadPriority);
-    }
-    ~RaisedPriority() { Platform::SetCurrentThreadPriority(before); }
-    RaisedPriority(const RaisedPriority&) = delete;
-    RaisedPriority& operator=(const RaisedPriority&) = delete;
-
-  private:
-    const int before;
-};
 
 std::uint32_t SecondsLimit(std::uint32_t seconds) {
     return WaitLimit(std::uint64_t{seconds} * 1000);
@@ -65,22 +51,19 @@ std::string PellandoFunctionality_PC::GetDeviceAddress(std::uint32_t deviceIndex
 TRACED
 
 void PellandoFunctionality_PC::Transfer(Request request, std::uint8_t direction, void* data,
-                                        std::uint32_t length) try {
+                                        std::uint32_t length) {
     record.block[NativeDriver::Block::Direction] = direction;
     record.block[NativeDriver::Block::Request] = static_cast<std::uint8_t>(request);
     device->PerformDeviceIOControl(record.block, data, length);
 }
-TRACED
 
-void PellandoFunctionality_PC::Send(Request request, std::uint32_t length) try {
+void PellandoFunctionality_PC::Send(Request request, std::uint32_t length) {
     Transfer(request, NativeDriver::DirectionOut, record.data.data(), length);
 }
-TRACED
 
-void PellandoFunctionality_PC::Receive(Request request, std::uint32_t length) try {
+void PellandoFunctionality_PC::Receive(Request request, std::uint32_t length) {
     Transfer(request, NativeDriver::DirectionIn, record.data.data(), length);
 }
-TRACED
 
 template <std::size_t Size>
 void PellandoFunctionality_PC::Put(std::size_t offset, const std::array<std::uint8_t, Size>& bytes) {
@@ -111,15 +94,15 @@ void PellandoFunctionality_PC::StartScan(std::uint32_t recordSize, std::uint32_t
 TRACED
 
 void PellandoFunctionality_PC::ReadStrip(std::uint32_t recordSize, std::uint32_t timeout,
-                                         std::uint32_t total) try {
-    const RaisedPriority raised;
+                                         std::uint32_t total) {
+    // A strip read must have its next read queued in time: its thread goes before others while it runs.
+    const Platform::ScopedThreadPriority raised(Platform::HighestThreadPriority);
     if (total != 0) {
         device->ReadDataCountedStrip(scanRecords, recordSize, timeout, total);
     } else {
         device->ReadDataStrip(scanRecords, recordSize, timeout);
     }
 }
-TRACED
 
 void PellandoFunctionality_PC::GetScanData(std::uint8_t* buffer, std::uint32_t* size) try {
     if (scanRecords.empty()) {

@@ -25,6 +25,8 @@ class PellandoFunctionality_PC final : public PellandoFunctionalityByte {
     PellandoFunctionality_PC(Generic::EventListener* listener, std::uint32_t deviceIndex);
     /// Closes the instrument.
     ~PellandoFunctionality_PC() override;
+    PellandoFunctionality_PC(const PellandoFunctionality_PC&) = delete;
+    PellandoFunctionality_PC& operator=(const PellandoFunctionality_PC&) = delete;
 
     void RemoveListener(Generic::EventListener* listener) override;
 

@@ -1,7 +1,7 @@
 #include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
-#include "DeviceDriver/Ostra/LowLevel/Win32/WaitLimit.h"
+#include "DeviceDriver/Ostra/LowLevel/WaitLimit.h"
 #include "Platform/DeviceFiles.h"
 #include "Platform/Threads.h"
 #include "Platform/WaitableObjects.h"

@@ -8,6 +8,7 @@
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Generic/Utilities/Timing.h"
+#include "DeviceDriver/Ostra/LowLevel/WaitLimit.h"
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
 #include "Platform/ScopedThreadPriority.h"
 #include "Platform/Time.h"
@@ -62,11 +63,6 @@ void ThrowIfUsbIoError(std::uint32_t status, const char* operation) {
     throw IOException(std::string("Error in UsbIo function: \"") + operation +
                           "\" Error: " + CUsbIo::ErrorText(text.data(), text.size(), status),
                       Here());
-}
-
-/// A huge time-out must not wrap into a short one, nor become the platform's mark for none.
-std::uint32_t TimeoutOf(std::uint64_t milliseconds) {
-    return static_cast<std::uint32_t>(std::min<std::uint64_t>(milliseconds, Platform::Infinite - 1));
 }
 
 template <std::size_t Size>
@@ -159,7 +155,7 @@ TRACED
 
 void PellandoFunctionality_Win64::ReadData(std::uint8_t* buffer, std::uint32_t length,
                                            std::uint64_t timeout) try {
-    ThrowIfUsbIoError(readPipe->ReadSync(buffer, length, TimeoutOf(timeout + ReadGrace)), "ReadSync");
+    ThrowIfUsbIoError(readPipe->ReadSync(buffer, length, WaitLimit(timeout + ReadGrace)), "ReadSync");
 }
 TRACED
 
