@@ -2,7 +2,6 @@
 #include <gtest/gtest.h>
 
 #include <map>
-
 #include <utility>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
