@@ -61,6 +61,7 @@ EventScheduler::EventId RealScheduler::CallAt(std::uint64_t time, std::function<
     if (place == events.begin()) {
         (waiterEntered ? waitersTurn : threadsTurn).notify_one();
     }
+    callEnded.notify_all();  // the end of the thread is not to be waited for any more
     const bool isAnEventsOwn = running != 0 && runner == std::this_thread::get_id();
     hold.unlock();
     if (!isAnEventsOwn) {
