@@ -364,7 +364,7 @@ TEST_P(MemoryCommandsTest, SeveralInstrumentsMustBeToldApartBeforeOneIsChanged) 
     host.Add("other");
     WriteFile(image, Calibrated("5"));
     for (const Arguments& command : std::vector<Arguments>{
-             {"eeprom", "write", image}, {"calibration", "set", "1211=5"}, {"log", "reset"}}) {
+             {"write-image", image}, {"eeprom", "write", image}, {"calibration", "set", "1211=5"}}) {
         Fail(command, ExitCode::Usage, "--device");
     }
     ExpectUnchanged();

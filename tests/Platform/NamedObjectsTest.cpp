@@ -59,13 +59,6 @@ int HoldForGood(const std::vector<std::string>& arguments) {
     std::_Exit(isGood ? 0 : 1);
 }
 
-int WaitAndRelease(const std::vector<std::string>& arguments) {
-    const Stage stage(arguments[0]);
-    ReleaseSemaphore(stage.ready.Get(), 1);
-    const bool isGood = Acquire(stage) && ReleaseMutex(stage.mutex.Get());
-    return isGood ? 0 : 1;
-}
-
 void Increment(const std::string& path) {
     int count = 0;
     std::ifstream(path) >> count;
@@ -105,16 +98,6 @@ TEST(NamedMutexes, ExcludeOtherProcessesUntilTheLastRelease) {
     EXPECT_EQ(Wait(stage.mutex.Get(), LongTimeout), WaitResult::Signalled);
     EXPECT_EQ(helper.WaitForExit(), 0);
     EXPECT_TRUE(ReleaseMutex(stage.mutex.Get()));
-}
-
-TEST(NamedMutexes, EndTheWaitOfAnotherProcess) {
-    const Stage stage(NameOfThisTest());
-    ASSERT_TRUE(Acquire(stage));
-    HelperProcess helper("WaitAndRelease", {NameOfThisTest()});
-    stage.AwaitReady();
-    SleepMilliseconds(30);
-    EXPECT_TRUE(ReleaseMutex(stage.mutex.Get()));
-    EXPECT_EQ(helper.WaitForExit(), 0);
 }
 
 TEST(NamedMutexes, EndTheWaitOfAThreadForSeveralObjects) {
@@ -213,10 +196,7 @@ TEST(NamedObjects, LeaveNothingBehind) {
 }  // namespace
 
 std::vector<TestSupport::Helper> NamedObjectsHelpers() {
-    return {{"HoldTwice", HoldTwice},
-            {"HoldForGood", HoldForGood},
-            {"WaitAndRelease", WaitAndRelease},
-            {"Count", Count}};
+    return {{"HoldTwice", HoldTwice}, {"HoldForGood", HoldForGood}, {"Count", Count}};
 }
 
 }  // namespace Varnholt::Platform

@@ -7,21 +7,10 @@
 namespace Varnholt::Platform {
 
 inline void PrintTo(WaitResult result, std::ostream* stream) {
-    switch (result) {
-        case WaitResult::Signalled:
-            *stream << "Signalled";
-            return;
-        case WaitResult::Abandoned:
-            *stream << "Abandoned";
-            return;
-        case WaitResult::TimedOut:
-            *stream << "TimedOut";
-            return;
-        case WaitResult::Failed:
-            *stream << "Failed";
-            return;
-    }
-    *stream << "wait result " << static_cast<std::uint32_t>(result);
+    *stream << (result == WaitResult::Signalled   ? "Signalled"
+                : result == WaitResult::Abandoned ? "Abandoned"
+                : result == WaitResult::TimedOut  ? "TimedOut"
+                                                  : "Failed");
 }
 
 }  // namespace Varnholt::Platform

@@ -42,19 +42,6 @@ TEST(SensorModelTest, MoreLightOrTimeGivesMoreUntilItSaturates) {
     EXPECT_LT(normal[0], 200) << "a covered pixel";
 }
 
-TEST(SensorModelTest, LooksLikeASpectrum) {
-    const auto values = Readings(SensorModel(1, 1.0, 1.0), {20000});
-    const auto highest = std::max_element(values.begin() + 1, values.begin() + 127);
-    EXPECT_GT(*highest, 20000);
-    EXPECT_LT(*highest, 60000);
-    EXPECT_LT(values[5], *highest / 10);
-    int peaks = 0;
-    for (std::size_t i = 2; i < 126; ++i) {
-        peaks += values[i] > values[i - 1] + 1000 && values[i] > values[i + 1] + 1000 ? 1 : 0;
-    }
-    EXPECT_GE(peaks, 3);
-}
-
 TEST(SensorModelTest, NoiseIsSeededAndAveragesOut) {
     const SensorModel dark(1, 0.0, 1.0);
     EXPECT_EQ(Readings(dark, {20000}, 3, 4), Readings(dark, {20000}, 3, 4));

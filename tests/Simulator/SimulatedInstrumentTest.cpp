@@ -98,25 +98,6 @@ TEST_F(SimulatedInstrumentTest, RefusesWhatItCannotDo) {
     EXPECT_EQ(8U, Do(TestTransfer::VendorQuestion(Request::GetChipId, 8)).size());
 }
 
-TEST_F(SimulatedInstrumentTest, AnswersAreInWireOrderAndCutToWhatIsAskedFor) {
-    Do(TestTransfer::Vendor(Request::SetMeasureParameters, {0x01, 0x26, 0x02, 0x03, 0x04, 0x05, 0x06, 0x77}));
-    Do(TestTransfer::Vendor(Request::WriteCpld, {0x12, 0x34, 0, 0, 0, 0}));
-    struct Case {
-        Request request;
-        std::uint16_t length;
-        Bytes expected;
-    };
-    for (const Case& test : {
-             Case{Request::GetMeasureParameters, 8, {0x01, 0x26, 0x02, 0x03, 0x04, 0x05, 0x06, 0x55}},
-             Case{Request::GetMisc, 8, {0x01, 0x2D, 0x05, 0x06, 0x07, 0x08, 0x21, 0x43}},
-             Case{Request::GetMeasureMode, 6, {3, 1, 0, 130, 68, 1}},
-             Case{Request::ReadCpld, 2, {0x12, 0x34}},
-             Case{Request::GetMisc, 3, {0x01, 0x2D, 0x05}},
-         }) {
-        EXPECT_EQ(test.expected, Do(TestTransfer::VendorQuestion(test.request, test.length)));
-    }
-}
-
 TEST_F(SimulatedInstrumentTest, ReadoutComesOnceAndThenNothing) {
     TestTransfer early = TestTransfer::In(BulkInEndpoint, 256);
     instrument.Submit(early);
@@ -259,25 +240,6 @@ TEST_F(SimulatedInstrumentTest, ButtonReportWaitsForTheHost) {
     instrument.Submit(third);
     EXPECT_EQ(0, third.completions) << "two presses that nobody fetched make one report";
     instrument.Cancel(third);
-}
-
-TEST_F(SimulatedInstrumentTest, ButtonIsPressedAfterEachClaim) {
-    InstrumentSettings settings;
-    settings.buttonAfterMilliseconds = 300;
-    SimulatedInstrument pressed(scheduler, settings);
-    for (int round = 0; round < 2; ++round) {
-        TestTransfer interrupt = TestTransfer::In(InterruptInEndpoint, 1);
-        pressed.Claim();
-        pressed.Submit(interrupt);
-        scheduler.Advance(299'999);
-        EXPECT_EQ(0, interrupt.completions);
-        scheduler.Advance(1);
-        EXPECT_EQ(1, interrupt.completions);
-        pressed.Release();
-    }
-    pressed.Claim();
-    pressed.Release();
-    EXPECT_EQ(0U, scheduler.Waiting()) << "released before the button was due";
 }
 
 TEST_F(SimulatedInstrumentTest, HaltedEndpointStallsUntilCleared) {
