@@ -3,6 +3,7 @@
 
 #include "Platform/CallFilter.h"
 #include "Platform/Drivers/DriverFixture.h"
+#include "Platform/OverlappedRequest.h"
 #include "Platform/Threads.h"
 
 namespace Varnholt::Tests {
@@ -214,6 +215,16 @@ TEST_F(OverlappedFiles, AllFilesLeftOpenAreClosedWithTheFileSystem) {
     files.reset();
     EXPECT_FALSE(device->IsOpen());
     EXPECT_TRUE(request.TakeSignal());
+}
+
+TEST_F(OverlappedFiles, ServeRequestsThatEndTheirTransfer) {
+    const Platform::ScopedDeviceFiles scope(*files);
+    {
+        Platform::OverlappedRequest owning(request.event.Get());
+        EXPECT_FALSE(owning.StartRead(pipe, buffer.data(), 8));
+        EXPECT_EQ(device->Pending(In), 1u);
+    }
+    EXPECT_EQ(device->Pending(In), 0u);
 }
 
 TEST_F(OverlappedFiles, RunOutOfPlacesAndRecover) {
