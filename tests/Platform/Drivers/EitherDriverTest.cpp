@@ -119,7 +119,7 @@ TEST_P(EitherDriver, AbortEndsTheTransfersOfTheEndpoint) {
     EXPECT_EQ(Result(interrupt, other, true), (Outcome{0, 1}));
 }
 
-TEST_P(EitherDriver, AnInterruptionEndsAllTransfers) {
+TEST_P(EitherDriver, AnInterruptionEndsAllTransfersAndLetsNoneStart) {
     device->LeaveToTest(BulkInEndpoint);
     device->LeaveToTest(InterruptInEndpoint);
     const auto drivers = std::move(files);
@@ -136,6 +136,17 @@ TEST_P(EitherDriver, AnInterruptionEndsAllTransfers) {
     EXPECT_EQ(Result(opened[1], requests[0]), (Outcome{CodeOfAbort(), 0}));
     EXPECT_EQ(Result(opened[1], requests[1]), (Outcome{CodeOfAbort(), 0}));
     EXPECT_EQ(Result(opened[2], requests[2]), (Outcome{CodeOfAbort(), 0}));
+
+    Request refused;
+    EXPECT_FALSE(StartRead(opened[1], buffers[0], refused));
+    EXPECT_EQ(Platform::LastError(), Errors::OperationAborted);
+    EXPECT_TRUE(refused.TakeSignal()) << "nobody must wait for what is refused";
+    EXPECT_FALSE(files->StartControl(opened[0], 0, nullptr, 0, nullptr, 0, refused.record));
+    EXPECT_EQ(Platform::LastError(), Errors::OperationAborted);
+    inFront.Resume();
+    StartPending(opened[1], buffers[0], requests[0]);
+    device->Send(BulkInEndpoint, {1, 2});
+    EXPECT_EQ(Result(opened[1], requests[0]), (Outcome{0, 2}));
     for (const Handle file : opened) {
         EXPECT_TRUE(files->CloseFile(file));
     }

@@ -182,47 +182,36 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
 }
 
 TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
-    using Misdeed = std::function<void(const UsbIp::SubmitPacket&)>;
     struct Case {
         const char* name;
-        Misdeed misdeed;
+        std::function<Bytes(const UsbIp::SubmitPacket&)> sends;
+        bool leaves = false;
+    };
+    /// An answer that announces some bytes and brings others.
+    const auto reply = [](std::uint32_t sequence, std::uint32_t announced, std::size_t bytes = 0) {
+        return Bytes() + UsbIp::Encode(UsbIp::SubmitReply{sequence, 0, announced}) + Bytes(bytes);
     };
     for (const Case& test : {
-             Case{"leaves", [&](auto&) { ClosePeer(); }},
-             Case{"leaves in the middle of the data",
-                  [&](auto& submit) {
-                      PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 64}) +
-                                Bytes(32));
-                      ClosePeer();
-                  }},
+             Case{"leaves", [](auto&) { return Bytes(); }, true},
+             Case{"leaves amid the data", [&](auto& submit) { return reply(submit.sequence, 64, 32); }, true},
              Case{"answers what was not asked",
-                  [&](auto& submit) {
-                      PeerSends(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence + 100, 0, 0}));
-                  }},
-             Case{"sends more than was asked for",
-                  [&](auto& submit) {
-                      PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 65}) +
-                                Bytes(65));
-                  }},
-             Case{"announces 4 GB",
-                  [&](auto& submit) {
-                      PeerSends(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 0xFFFFFFFF}));
-                  }},
-             Case{"submits to a host", [&](auto& submit) { PeerSends(UsbIp::Encode(submit)); }},
-             Case{"sends garbage", [&](auto&) { PeerSends(Bytes(48, 0x5A)); }},
-             Case{"stops in the middle of a header", [&](auto&) { PeerSends(Bytes(20)); }},
-             Case{"stops in the middle of the data",
-                  [&](auto& submit) {
-                      PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 64}) +
-                                Bytes(32));
-                  }},
+                  [&](auto& submit) { return reply(submit.sequence + 100, 0); }},
+             Case{"sends too much", [&](auto& submit) { return reply(submit.sequence, 65, 65); }},
+             Case{"announces 4 GB", [&](auto& submit) { return reply(submit.sequence, 0xFFFFFFFF); }},
+             Case{"submits to a host", [](auto& submit) { return Bytes() + UsbIp::Encode(submit); }},
+             Case{"sends garbage", [](auto&) { return Bytes(48, 0x5A); }},
+             Case{"stops in the middle of a header", [](auto&) { return Bytes(20); }},
+             Case{"stops amid the data", [&](auto& submit) { return reply(submit.sequence, 64, 32); }},
          }) {
         const auto device = MakeClaimedDevice();
         TestTransfer first = TestTransfer::In(BulkInEndpoint, 64);
         TestTransfer second = TestTransfer::Out(BulkOutEndpoint, Bytes(64));
         ASSERT_EQ(Errors::Success, device->Submit(first));
         ASSERT_EQ(Errors::Success, device->Submit(second));
-        test.misdeed(PeerReceivesPacket<UsbIp::SubmitPacket>());
+        PeerSends(test.sends(PeerReceivesPacket<UsbIp::SubmitPacket>()));
+        if (test.leaves) {
+            ClosePeer();
+        }
         ASSERT_TRUE(first.Wait()) << test.name;
         ASSERT_TRUE(second.Wait()) << test.name;
         EXPECT_EQ(TransferStatus::DeviceGone, first.status) << test.name;
