@@ -4,6 +4,7 @@
 #include <functional>
 #include <memory>
 #include <new>
+#include <string>
 #include <thread>
 
 #include "Platform/Drivers/DriverFixture.h"
@@ -57,45 +58,38 @@ TEST(RequestOrder, EndsOnceInEveryOrder) {
     constexpr auto Complete = &HookedDevice::Complete;
     struct Case {
         const char* name;
-        bool cancelInSubmit;
-        bool completeInSubmit;
-        bool refuse;
-        bool completeInCancel;
-        bool atOnce;  ///< `StartRead` answers true
+        std::string inSubmit;  ///< what happens there: c cancelled, d done, r refused
+        bool endedByCancel;    ///< as soon as the device is told of it, with three bytes
         Outcome outcome;
         int cancels;
     };
     const Case cases[] = {
-        {"completed in submit", false, true, false, false, true, {0, 8}, 0},
-        {"cancelled before it was accepted",
-         true,
-         false,
-         false,
-         true,
-         false,
-         {Errors::OperationAborted, 3},
-         1},
-        {"cancelled, then completed, in submit", true, true, false, false, true, {0, 8}, 0},
-        {"cancelled, then refused", true, false, true, false, false, {Errors::GeneralFailure, 0}, 0},
-        {"cancelled before accepted, completed later", true, false, false, false, false, {0, 8}, 1},
+        {"completed in submit", "d", false, {0, 8}, 0},
+        {"cancelled before it was accepted", "c", true, {Errors::OperationAborted, 3}, 1},
+        {"cancelled, then completed, in submit", "cd", false, {0, 8}, 0},
+        {"cancelled, then refused", "cr", false, {Errors::GeneralFailure, 0}, 0},
+        {"cancelled before accepted, completed later", "c", false, {0, 8}, 1},
     };
     for (const Case& row : cases) {
+        SCOPED_TRACE(row.name);
+        const bool refused = row.inSubmit.ends_with('r');
+        const bool atOnce = row.inSubmit.ends_with('d');
         HookedBus bus;
         const auto files = Platform::Drivers::MakeDriverFileSystem(bus);
         const auto main = files->Open("native/port1");
         const auto pipe = files->Open("native/port1\\PIPE01");
         Transfer* running = nullptr;
         bus.device->onSubmit = [&](Transfer& transfer) {
-            if (row.cancelInSubmit) {
+            if (row.inSubmit.starts_with('c')) {
                 Request abort;
                 const auto block = NativeBlock(0, 0, In);
                 EXPECT_TRUE(files->StartControl(main, Native::ControlAbortPipe, block.data(), 10, nullptr, 0,
                                                 abort.record));
             }
-            if (row.refuse) {
+            if (refused) {
                 return Errors::GeneralFailure;
             }
-            if (row.completeInSubmit) {
+            if (atOnce) {
                 Complete(transfer, TransferStatus::Completed, 8);
             } else {
                 running = &transfer;
@@ -103,27 +97,26 @@ TEST(RequestOrder, EndsOnceInEveryOrder) {
             return Errors::Success;
         };
         bus.device->onCancel = [&](Transfer& transfer) {
-            EXPECT_EQ(&transfer, running) << row.name << ": cancelled what the device does not have";
-            if (row.completeInCancel) {
+            EXPECT_EQ(&transfer, running) << "cancelled what the device does not have";
+            if (row.endedByCancel) {
                 running = nullptr;
                 Complete(transfer, TransferStatus::Cancelled, 3);
             }
         };
         Bytes buffer(8);
         Request request;
-        EXPECT_EQ(files->StartRead(pipe, buffer.data(), 8, request.record), row.atOnce) << row.name;
-        EXPECT_TRUE(row.atOnce ||
-                    Platform::LastError() == (row.refuse ? row.outcome.code : Errors::IoPending))
-            << row.name << ": " << Platform::LastError();
+        EXPECT_EQ(files->StartRead(pipe, buffer.data(), 8, request.record), atOnce);
+        EXPECT_TRUE(atOnce || Platform::LastError() == (refused ? row.outcome.code : Errors::IoPending))
+            << Platform::LastError();
         if (running != nullptr) {
             Complete(*running, TransferStatus::Completed, 8);
         }
         std::uint32_t moved = 0;
         const bool succeeded = files->GetResult(pipe, request.record, moved, false);
-        EXPECT_EQ((Outcome{succeeded ? 0 : Platform::LastError(), moved}), row.outcome) << row.name;
-        EXPECT_EQ(request.TakeSignal(), !row.refuse) << row.name;
-        EXPECT_FALSE(request.TakeSignal()) << row.name << ": signalled twice";
-        EXPECT_EQ(bus.device->cancels, row.cancels) << row.name;
+        EXPECT_EQ((Outcome{succeeded ? 0 : Platform::LastError(), moved}), row.outcome);
+        EXPECT_EQ(request.TakeSignal(), !refused);
+        EXPECT_FALSE(request.TakeSignal()) << "signalled twice";
+        EXPECT_EQ(bus.device->cancels, row.cancels);
         EXPECT_TRUE(files->CloseFile(pipe));
         EXPECT_TRUE(files->CloseFile(main));
     }
