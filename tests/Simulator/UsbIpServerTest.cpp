@@ -167,13 +167,18 @@ TEST_F(UsbIpServerTest, OneProgramAtATime) {
 }
 
 TEST_F(UsbIpServerTest, FaultsCrossTheConnection) {
-    server.Add(name, {}, "bulk-in 0:stall; bulk-in 2:late-cancel; control 3:gone-before");
+    server.Add(name, {},
+               "bulk-in 0:io-error; bulk-in 1:overflow; bulk-in 2:stall; bulk-in 4:late-cancel; control "
+               "3:gone-before");
     for (int round = 0; round < 2; ++round) {
         const auto device = OpenAndClaim(name);
-        TestTransfer stalled = TestTransfer::In(BulkInEndpoint, 64);
-        device->Submit(stalled);
-        ASSERT_TRUE(stalled.Wait());
-        EXPECT_EQ(TransferStatus::Stalled, stalled.status);
+        for (const auto status :
+             {TransferStatus::IoError, TransferStatus::Overflow, TransferStatus::Stalled}) {
+            TestTransfer failing = TestTransfer::In(BulkInEndpoint, 64);
+            device->Submit(failing);
+            ASSERT_TRUE(failing.Wait());
+            EXPECT_EQ(status, failing.status);
+        }
         ASSERT_EQ(Errors::Success, device->ClearHalt(BulkInEndpoint));
 
         Do(*device, TestTransfer::Memory(Request::ReadEeprom, 4096, 64));
