@@ -11,10 +11,7 @@ namespace {
 
 using namespace Protocol::UsbIoDriver;
 using testing::ElementsAre;
-using testing::HasSubstr;
 using testing::IsEmpty;
-using testing::Not;
-using Tests::ScriptedDriver;
 
 TEST(CUsbIoErrorText, TextsAreThoseOfTheTable) {
     const std::vector<std::pair<std::uint32_t, const char*>> cases{

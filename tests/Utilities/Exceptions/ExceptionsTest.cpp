@@ -14,7 +14,6 @@ namespace Varnholt::Utilities::Exceptions {
 namespace {
 
 using DeviceDriver::Generic::Utilities::DataException;
-using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::StartsWith;
 

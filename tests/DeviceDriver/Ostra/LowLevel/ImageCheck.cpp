@@ -1,5 +1,6 @@
 #include "ImageCheck.h"
 
+#include <optional>
 #include <stdexcept>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
@@ -18,9 +19,14 @@ using Varnholt::Utilities::Exceptions::ResourceException;
 
 namespace {
 
-bool IsUnknownIdentifier(const ResourceException& exception) {
+bool IsDocumented(const std::exception& exception) {
     const std::string text = exception.what();
-    return text.starts_with("id ") && text.ends_with(" doesn't exist");
+    if (dynamic_cast<const DataException*>(&exception)) {
+        return text == PellandoEAT::CorruptTable;
+    }
+    return dynamic_cast<const ResourceException*>(&exception) &&
+           ((text.starts_with("id ") && text.ends_with(" doesn't exist")) ||
+            text == "Configuration data dump target too small");
 }
 
 /// False when `action` was refused with an exception that is documented for it.
@@ -29,17 +35,11 @@ bool Succeeds(const char* what, Action action) {
     try {
         action();
         return true;
-    } catch (const DataException& exception) {
-        if (std::string(exception.what()) == PellandoEAT::CorruptTable) {
-            return false;
+    } catch (const std::exception& exception) {
+        if (!IsDocumented(exception)) {
+            throw std::logic_error(std::string(what) + ": " + exception.what());
         }
-        throw std::logic_error(std::string(what) + ": " + exception.what());
-    } catch (const ResourceException& exception) {
-        if (IsUnknownIdentifier(exception) ||
-            std::string(exception.what()) == "Configuration data dump target too small") {
-            return false;
-        }
-        throw std::logic_error(std::string(what) + ": " + exception.what());
+        return false;
     }
 }
 
@@ -89,11 +89,8 @@ Property Resized(Property value, std::uint16_t elements) {
 ImageOutcome CheckImage(const Bytes& image, const std::vector<Resize>& resizes) {
     FakeInstrument instrument{.eeprom = image};
     const auto functionality = Open(instrument);
-    Varnholt::Utilities::Tools::SmartPointer<PellandoEEPROM> eeprom;
-    if (!Succeeds("load", [&] {
-            eeprom =
-                Varnholt::Utilities::Tools::SmartPointer<PellandoEEPROM>(new PellandoEEPROM(functionality));
-        })) {
+    std::optional<PellandoEEPROM> eeprom;
+    if (!Succeeds("load", [&] { eeprom.emplace(functionality); })) {
         return ImageOutcome::Refused;
     }
     Bytes dumped;

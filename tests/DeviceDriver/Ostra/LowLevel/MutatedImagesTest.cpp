@@ -32,17 +32,26 @@ Bytes MutatedImage(const Bytes& fresh, std::uint32_t seed) {
     return image;
 }
 
+/// How often each outcome came about; ends with the first failure.
+template <class Check>
+std::array<int, 3> Outcomes(std::uint32_t count, Check check) {
+    std::array<int, 3> outcomes{};
+    for (std::uint32_t seed = 0; seed < count; ++seed) {
+        try {
+            ++outcomes[static_cast<std::size_t>(check(seed))];
+        } catch (const std::exception& exception) {
+            ADD_FAILURE() << "seed " << seed << ": " << exception.what();
+            break;
+        }
+    }
+    return outcomes;
+}
+
 TEST(MutatedImages, GiveAModelThatRoundTripsOrADocumentedException) {
     const Bytes fresh = FreshImage();
     ASSERT_EQ(CheckImage(fresh), ImageOutcome::RoundTripRight);
-    std::array<int, 3> outcomes{};
-    for (std::uint32_t seed = 0; seed < OSTRA_MUTATED_IMAGES; ++seed) {
-        try {
-            ++outcomes[static_cast<std::size_t>(CheckImage(MutatedImage(fresh, seed)))];
-        } catch (const std::exception& exception) {
-            FAIL() << "image " << seed << ": " << exception.what();
-        }
-    }
+    const auto outcomes = Outcomes(OSTRA_MUTATED_IMAGES,
+                                   [&](std::uint32_t seed) { return CheckImage(MutatedImage(fresh, seed)); });
     std::cout << OSTRA_MUTATED_IMAGES << " images: " << outcomes[0] << " refused, " << outcomes[1]
               << " loaded but not to be dumped, " << outcomes[2] << " round trips\n";
     for (const int outcome : outcomes) {
@@ -51,8 +60,7 @@ TEST(MutatedImages, GiveAModelThatRoundTripsOrADocumentedException) {
 }
 
 TEST(MutatedImages, ValuesOfAnySizeRoundTripOrAreRefused) {
-    std::array<int, 3> outcomes{};
-    for (std::uint32_t seed = 0; seed < OSTRA_MUTATED_IMAGES / 10; ++seed) {
+    const auto outcomes = Outcomes(OSTRA_MUTATED_IMAGES / 10, [](std::uint32_t seed) {
         std::minstd_rand random(seed + 1);
         Bytes records;
         for (auto count = random() % 4; count-- > 0;) {
@@ -63,12 +71,8 @@ TEST(MutatedImages, ValuesOfAnySizeRoundTripOrAreRefused) {
                            {static_cast<std::uint8_t>(33 + random() % 200), value,
                             static_cast<std::uint8_t>(elements >> 8), static_cast<std::uint8_t>(elements)});
         }
-        try {
-            ++outcomes[static_cast<std::size_t>(CheckRecords(records.data(), records.size()))];
-        } catch (const std::exception& exception) {
-            FAIL() << "seed " << seed << ": " << exception.what();
-        }
-    }
+        return CheckRecords(records.data(), records.size());
+    });
     EXPECT_EQ(outcomes[0], 0) << "a fresh image can be loaded";
     EXPECT_GT(outcomes[1], 0);
     EXPECT_GT(outcomes[2], outcomes[1]);

@@ -23,7 +23,6 @@ using testing::ElementsAreArray;
 using testing::IsEmpty;
 using Tests::ExpectThrow;
 using Varnholt::Utilities::Exceptions::ResourceException;
-using Varnholt::Utilities::Exceptions::RuntimeException;
 using Longs = std::vector<std::int32_t>;
 
 const std::vector<Command> LogWrites{{"WriteEEPROM", 0, 256},    {"WriteEEPROM", 256, 256},

@@ -11,6 +11,8 @@ namespace Varnholt::Tests {
 namespace {
 
 using namespace Platform;
+using DeviceDriver::Generic::MessageButtonData;
+using DeviceDriver::Generic::MessageDeviceGone;
 using DeviceDriver::Ostra::LowLevel::PellandoUSBDevice;
 using DeviceDriver::Ostra::LowLevel::ScanRecordList;
 using testing::ElementsAre;
@@ -19,8 +21,6 @@ using testing::SizeIs;
 using Varnholt::Utilities::Multithreading::Mutex;
 using Varnholt::Utilities::Multithreading::ScopedLock;
 
-using DeviceDriver::Generic::MessageButtonData;
-using DeviceDriver::Generic::MessageDeviceGone;
 constexpr std::uint32_t InterruptPipe = 3;
 const Answer ButtonData{.data = {1}};
 const std::string Path = "native/1";

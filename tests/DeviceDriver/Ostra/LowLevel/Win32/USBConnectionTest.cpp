@@ -9,7 +9,6 @@ using namespace Platform;
 using DeviceDriver::Ostra::LowLevel::USBConnection;
 using Protocol::NativeDriver::ControlBlock;
 using testing::ElementsAre;
-using testing::IsEmpty;
 
 constexpr ControlBlock OutwardBlock{0, 2, 0, 0, 0xCA, 0, 0, 0, 0, 0};
 constexpr std::uint32_t Control = Protocol::NativeDriver::ControlVendorRequest;
