@@ -138,11 +138,20 @@ TEST(Exceptions, VerboseTextShowsTheTrace) {
 TEST(Exceptions, CauseIsASnapshot) {
     RuntimeException exception("message", "A");
     exception.AddLocation("");
-    std::ostringstream text;
-    Cause(static_cast<const std::runtime_error&>(exception)).Print(text);
-    EXPECT_EQ(text.str(),
-              "\ncaused by: " + Tools::ReadableName(typeid(RuntimeException)) + ": message\n\tA\n");
-    EXPECT_TRUE(Cause().IsEmpty());
+    const std::pair<Cause, std::string> cases[] = {
+        {Cause(static_cast<const std::runtime_error&>(exception)),
+         "\ncaused by: " + Tools::ReadableName(typeid(RuntimeException)) + ": message\n\tA\n"},
+        {Cause(StreamFailure("message")),
+         "\ncaused by: " + Tools::ReadableName(typeid(StreamFailure)) + ": message\n"},
+        {Cause(), ""},
+    };
+    for (const auto& [cause, expected] : cases) {
+        std::ostringstream text;
+        cause.Print(text);
+        EXPECT_EQ(text.str(), expected);
+        EXPECT_STREQ(cause.what(), expected.empty() ? "" : "message");
+        EXPECT_EQ(cause.IsEmpty(), expected.empty());
+    }
 }
 
 TEST(SmartPointer, SharesAndReleases) {

@@ -80,6 +80,8 @@ TEST(PrecisionTime, CarriesAndBorrowsOnceAndCompares) {
     EXPECT_EQ(PrecisionTime(3, 100000) - PrecisionTime(1, 200000), PrecisionTime(1, 900000));
     EXPECT_EQ(PrecisionTime(3, 200000) - PrecisionTime(1, 200000), PrecisionTime(2, 0));
     EXPECT_EQ(PrecisionTime(1, 0) - PrecisionTime(2, 1), PrecisionTime(-2, 999999));
+    EXPECT_EQ(PrecisionTime(2, 123456).GetMilliseconds(), 123);
+    EXPECT_EQ(PrecisionTime(2, 123456).GetMicroseconds(), 456);
     const PrecisionTime a(5, 999999), b(6, 0), c(6, 1), negative(-1, 0);
     EXPECT_TRUE(a < b && b < c && a <= b && c > a && c >= c && a != b && negative < a);
 }

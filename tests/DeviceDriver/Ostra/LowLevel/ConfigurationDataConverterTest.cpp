@@ -14,6 +14,7 @@ namespace {
 using namespace Generic::Configuration;
 using Generic::Utilities::DataException;
 using Tests::ExpectThrow;
+using Varnholt::Utilities::Exceptions::RuntimeException;
 using Ids = std::set<int>;
 
 /// Calibration, log, misc and measure parameters show in what the memory model loads.
@@ -77,13 +78,22 @@ TEST(ConfigurationDataConverter, EveryIdentifierHasItsDefaultOrNone) {
     }
 }
 
-TEST(ConfigurationDataConverter, ConvertsBigEndian) {
-    Property entry(0.0F);
-    ConfigurationDataConverter::ByteArrayToConfigurationDataEntry({0xBF, 0x80, 0, 0}, entry);
-    EXPECT_EQ(entry.AsFloat(), -1.0F);
+TEST(ConfigurationDataConverter, ConvertsBigEndianWhatHasAType) {
+    using Converter = ConfigurationDataConverter;
+    Property entry = Converter::GetDefaultProperty(1000);
+    Converter::ByteArrayToConfigurationDataEntry({0xBF, 0x80, 0, 0, 0x3F, 0x80, 0, 0}, entry);
+    EXPECT_EQ(entry.AsFloatVector(), (std::vector<float>{-1.0F, 1.0F}));
     std::vector<std::uint8_t> bytes{1, 2, 3};
-    ConfigurationDataConverter::ConfigurationDataEntryToByteArray(Property(std::int32_t{-2}), bytes);
-    EXPECT_EQ(bytes, (std::vector<std::uint8_t>{0xFF, 0xFF, 0xFF, 0xFE}));
+    for (const auto& [value, last] : {std::pair{-1, 0xFF}, std::pair{-2, 0xFE}}) {
+        Converter::ConfigurationDataEntryToByteArray(Property(std::int32_t{value}), bytes);
+        EXPECT_EQ(bytes, (std::vector<std::uint8_t>{0xFF, 0xFF, 0xFF, static_cast<std::uint8_t>(last)}));
+    }
+    Property untyped;
+    constexpr const char* refusal = "Invalid configuration data type.";
+    ExpectThrow<RuntimeException>(refusal,
+                                  [&] { Converter::ByteArrayToConfigurationDataEntry(bytes, untyped); });
+    ExpectThrow<RuntimeException>(refusal,
+                                  [&] { Converter::ConfigurationDataEntryToByteArray(untyped, bytes); });
 }
 
 }  // namespace

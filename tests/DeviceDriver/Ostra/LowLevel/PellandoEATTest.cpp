@@ -274,6 +274,12 @@ TEST(SectionReader, RefusesWhatTheTableDoesNotSay) {
     const SectionReader readCalibration(lastHasNoEnd, &ConfigurationDataConverter::IsCalibrationParameter);
     ExpectThrow<ResourceException>("id 3010 doesn't exist", [&] { readCalibration(image.data(), 0); });
 
+    PellandoEAT withAnUnknown;
+    withAnUnknown.CreateSection({}, 4608, 1206, 0);
+    withAnUnknown.CreateSection({}, 4612, 2, 0);
+    const SectionReader readAll(withAnUnknown, [](std::uint16_t id) { return id > 2; });
+    ExpectThrow<DataException>("invalid property id 1206", [&] { readAll(image.data(), 0); });
+
     PellandoEAT withoutCopy;
     withoutCopy.CreateSection(PellandoEAT::GetDefaultLogData(), 0, 1, 0);
     const SectionReader readLog(withoutCopy, &ConfigurationDataConverter::IsLogParameter);

@@ -326,6 +326,16 @@ TEST_F(EepromTest, DestructorWritesTheLogTwiceOrReportsThatItIsLost) {
     EXPECT_EQ(instrument.eeprom, FreshImage());
 }
 
+TEST_F(EepromTest, FailureInTheSecondCopyOfTheLogLeavesThatOneOld) {
+    Load();
+    eeprom->SetProperty(10002, Long(5));
+    instrument.failingCommand = 5;
+    ExpectThrow<IOException>("the fake fails", [&] { eeprom->DumpLog(); });
+    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites.begin(), LogWrites.begin() + 6));
+    EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[8]), 5U);
+    EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[2048 + 8]), 0U);
+}
+
 TEST_F(EepromTest, LogThatOutgrowsItsAreaNeverReachesTheTable) {
     Load();
     std::string reason;

@@ -341,6 +341,12 @@ TEST_F(ModeSearch, RefusesTimesThatNoModeCanCount) {
     }
 }
 
+TEST_F(ModeSearch, NeedsTheTimeBeforeItTriesAMode) {
+    set.GetDatastore().remove_if([](const auto& entry) { return entry.first == 2009; });
+    ExpectThrow<ResourceException>("id 2009 doesn't exist", [&] { ram.Store(set); });
+    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+}
+
 /// One of so many modes that is too slow for most times.
 Answers Slow(int modes, int mode) {
     return {static_cast<std::uint8_t>(modes), static_cast<std::uint8_t>(mode), 0, 255, 255, 1};
