@@ -22,7 +22,7 @@ struct ConditionState {
     Platform::OwnedHandle waitersDone{Platform::MakeAutoResetEvent()};
 };
 
-/// `waitersCountLock` is innermost and never held during a wait.
+/// `waitersCountLock` is innermost and never held while a wait lasts.
 class ConditionImpl final : public Condition::Impl {
   public:
     explicit ConditionImpl(Mutex& mutexOfCondition);
@@ -78,6 +78,9 @@ void ConditionImpl::broadcast() try {
         if (state->waitersCount <= 0) {
             return;
         }
+        if (!state->wasBroadcast) {
+            Platform::Wait(state->waitersDone.Get(), 0);  // takes away what a failed waiter has left there
+        }
         released = Platform::ReleaseSemaphore(state->semaphore.Get(), state->waitersCount);
         state->wasBroadcast = released;
     }
@@ -112,10 +115,15 @@ bool ConditionImpl::Wait(std::int32_t) try {
         Platform::ReleaseMutex(mutexHandle);
         throw ResourceException("Condition::Wait() invalid Mutex! (must be a real mutex)", Here());
     }
+    const bool isLast = LeaveWaiters();
     const WaitResult reacquired =
-        LeaveWaiters() ? Platform::SignalAndWait(state->waitersDone.Get(), mutexHandle, Platform::Infinite)
-                       : Platform::Wait(mutexHandle, Platform::Infinite);
+        isLast ? Platform::SignalAndWait(state->waitersDone.Get(), mutexHandle, Platform::Infinite)
+               : Platform::Wait(mutexHandle, Platform::Infinite);
     if (reacquired != WaitResult::Signalled) {
+        if (isLast) {
+            // Nobody can tell whether that came as far as the signal, without which a broadcast never ends.
+            Platform::SignalEvent(state->waitersDone.Get());
+        }
         Platform::ReleaseMutex(mutexHandle);
         throw ResourceException("Condition::Wait() invalid mutex! (must be a real mutex)", Here());
     }
