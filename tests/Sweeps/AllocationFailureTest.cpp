@@ -1,5 +1,6 @@
 // The exported functions with the first, second, third... allocation failing, until a call gets by without a
 // failure.
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <array>
@@ -15,6 +16,7 @@
 #include "Platform/WaitableObjects.h"
 #include "Support/ResourceCount.h"
 #include "Support/SimulatedHost.h"
+#include "Utilities/Multithreading/Condition.h"
 
 namespace {
 
@@ -196,6 +198,23 @@ INSTANTIATE_TEST_SUITE_P(All, AllocationFailure,
                              return std::string(Name(std::get<0>(parameter.param))) + "_" +
                                     Cases[std::get<1>(parameter.param)].name;
                          });
+
+TEST(AllocationFailureOfACondition, SaysThatItsStateCannotBeMade) {
+    using Utilities::Multithreading::Condition;
+    Utilities::Multithreading::Mutex mutex("ostra-allocation-failure-test");
+    std::vector<std::string> texts;
+    for (bool isMade = false; !isMade;) {
+        untilFailure = static_cast<long>(texts.size()) + 1;
+        try {
+            const Condition condition(mutex);
+            isMade = true;
+        } catch (const std::exception& exception) {
+            texts.emplace_back(exception.what());
+        }
+        untilFailure = 0;
+    }
+    EXPECT_THAT(texts, testing::Contains("ConditionImpl::ConditionImpl() can't allocate!"));
+}
 
 }  // namespace
 }  // namespace Varnholt::Tests

@@ -2,8 +2,11 @@
 
 #include <atomic>
 #include <chrono>
+#include <functional>
+#include <memory>
 #include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include "Platform/CallFilter.h"
@@ -182,18 +185,43 @@ TEST_F(ConditionTest, BroadcastReportsAnEventItCannotWaitFor) {
 }
 
 TEST_F(ConditionTest, WaiterThatCannotTakeTheMutexAgainSaysSo) {
+    const struct {
+        const char* name;
+        void (Condition::*wake)();
+        const char* call;
+        bool fails;  ///< or else finds a mutex whose owner has ended
+    } cases[] = {{"woken alone", &Condition::signal, "Wait", true},
+                 {"last of a broadcast", &Condition::broadcast, "SignalAndWait", true},
+                 {"last, abandoned mutex", &Condition::broadcast, "SignalAndWait", false}};
+    const auto onceAtTheWaiters = [](std::string_view name, std::function<Platform::ErrorCode()> action) {
+        auto done = std::make_shared<std::atomic<bool>>(false);
+        Platform::InstallCallFilter([=, waker = std::this_thread::get_id()](std::string_view call) {
+            const bool isMeant = call == name && std::this_thread::get_id() != waker;
+            return isMeant && !done->exchange(true) ? action() : Platform::Errors::Success;
+        });
+    };
+    for (const auto& row : cases) {
+        SCOPED_TRACE(row.name);
+        StartWaiters(1);
+        onceAtTheWaiters(row.call, [this, fails = row.fails] {
+            if (!fails) {
+                std::thread([this] { mutex.Lock(); }).join();
+            }
+            return fails ? Platform::Errors::InvalidHandle : Platform::Errors::Success;
+        });
+        (condition.*row.wake)();
+        Await([this] { return waiting == 0; });
+        EXPECT_EQ(std::exchange(failure, ""), "Condition::Wait() invalid mutex! (must be a real mutex)");
+    }
     StartWaiters(1);
-    std::atomic<bool> done = false;
-    Platform::InstallCallFilter([waker = std::this_thread::get_id(), &done](std::string_view call) {
-        if (call != "Wait" || std::this_thread::get_id() == waker || done.exchange(true)) {
-            return Platform::Errors::Success;
-        }
-        return Platform::Errors::InvalidHandle;
+    std::atomic<bool> hasLeft = false;
+    onceAtTheWaiters("SignalAndWait", [&] {
+        std::this_thread::sleep_for(ALittle);
+        hasLeft = true;
+        return Platform::Errors::Success;
     });
-    condition.signal();
-    Await([this] { return woken == 1; });
-    Platform::InstallCallFilter({});
-    EXPECT_EQ(failure, "Condition::Wait() invalid mutex! (must be a real mutex)");
+    condition.broadcast();
+    EXPECT_TRUE(hasLeft) << "what the failures left behind passed for the end of this broadcast";
 }
 
 }  // namespace
