@@ -113,14 +113,21 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
         {"file not found", 0, [&] { driver.RefuseOpen("usbio/1", 2); }, Status::DeviceNotFound},
         {"file refused", 0, [&] { driver.RefuseOpen("usbio/1", 5); }, 5},
         {"no event", 1, [&] { failing("MakeAutoResetEvent", 8); }, Status::NoMemory},
+        {"no enumeration", 0, [&] { failing("LoadEnumeration", 126); }, Status::NoEnumeration},
+        {"interface cannot be found", 0, [&] { failing("FindInterface", 13); }, 13},
+        {"no detail", 0, [&] { failing("DetailSize", 13); }, Status::Failed},
+        {"detail cannot be read", 0, [&] { failing("ReadDetail", 13); }, 13},
         {"driver refuses", 1, [&] { driver.Script(Control::GetDriverInfo, {.code = 31, .after = 5}); }, 31},
         {"driver tells nothing", 1, [&] { driver.Script(Control::GetDriverInfo, {}); },
          Status::VersionMismatch},
     };
     for (const Case& row : cases) {
-        row.arrange();
         CUsbIo device;
-        EXPECT_EQ(Open(device, row.number), row.expected) << row.name;
+        {
+            const ScopedDeviceList list(InterfaceClass);
+            row.arrange();
+            EXPECT_EQ(device.Open(row.number, list.Get(), &InterfaceClass), row.expected) << row.name;
+        }
         Platform::InstallCallFilter({});
         EXPECT_FALSE(device.IsOpen()) << row.name;
         EXPECT_EQ(device.GetDevicePathName(), nullptr) << row.name;

@@ -1,5 +1,6 @@
 #include <algorithm>
 #include <atomic>
+#include <optional>
 
 #include "Protocol/Instrument.h"
 #include "Support/DriverTest.h"
@@ -74,6 +75,10 @@ class Writer final : public CUsbIoWriter {
 
     std::uint8_t writesWanted = 0;
     std::atomic<int> completed = 0;
+    std::vector<std::uint32_t> Errors() {
+        const std::lock_guard held(lock);
+        return errors;
+    }
 
   private:
     void PrepareBuffer(CUsbIoBuffer& buffer) override {
@@ -83,9 +88,15 @@ class Writer final : public CUsbIoWriter {
         *static_cast<std::uint8_t*>(buffer.Buffer) = ++sent;
     }
     void OnBufferCompleted(CUsbIoBuffer&) override { ++completed; }
+    void OnBufferError(CUsbIoBuffer& buffer) override {
+        const std::lock_guard held(lock);
+        errors.push_back(buffer.Status);
+    }
     void OnThreadExit() override { Platform::SignalEvent(exited.Get()); }
 
     Platform::OwnedHandle exited{Platform::MakeAutoResetEvent()};
+    std::mutex lock;
+    std::vector<std::uint32_t> errors;
     std::uint8_t sent = 0;
 };
 
@@ -139,8 +150,9 @@ TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
 TEST_F(CUsbIoThreadTest, EndsAfterTooManyErrorsInARow) {
     struct Case {
         const char* name;
-        std::vector<std::uint32_t> statuses;  ///< of the reads; then silence
+        std::vector<std::uint32_t> statuses;  ///< of the transfers; the next one would fail, too
         std::vector<std::uint32_t> errors;    ///< seen before the thread ends
+        std::optional<std::uint32_t> most = 2;
     };
     constexpr std::uint32_t Bad = Status::EndpointHalted;
     constexpr std::uint32_t Down = Status::DevicePoweredDown;
@@ -150,18 +162,28 @@ TEST_F(CUsbIoThreadTest, EndsAfterTooManyErrorsInARow) {
         {"powered down does not count",
          {Down, Down, Down, Down, Bad, Bad, Bad},
          {Down, Down, Down, Down, Bad, Bad, Bad}},
+        {"three are not too many", {Bad, Bad, Bad, 0, Bad, Bad, Bad, Bad}, std::vector(7, Bad), {}},
+    };
+    const auto run = [&](auto& stream, std::uint8_t endpoint, const Case& row) {
+        SCOPED_TRACE(row.name);
+        Bind(stream, endpoint);
+        for (const std::uint32_t status : row.statuses) {
+            driver.Script(endpoint, {.code = status, .after = 1});
+        }
+        driver.Script(endpoint, {.code = Bad});
+        ASSERT_TRUE(stream.AllocateBuffers(8, 1));
+        ASSERT_TRUE(row.most ? stream.StartThread(*row.most) : stream.StartThread());
+        EXPECT_TRUE(stream.WaitForExit());
+        EXPECT_EQ(stream.Errors(), row.errors);
+        EXPECT_TRUE(stream.ShutdownThread());
+        driver.DropScript(endpoint);
     };
     for (const Case& row : cases) {
         Reader reader;
-        Bind(reader, BulkInEndpoint);
-        for (const std::uint32_t status : row.statuses) {
-            driver.Script(BulkInEndpoint, {.code = status, .after = 1});
-        }
-        ASSERT_TRUE(reader.AllocateBuffers(8, 1));
-        ASSERT_TRUE(reader.StartThread(2));
-        EXPECT_TRUE(reader.WaitForExit()) << row.name;
-        EXPECT_EQ(reader.Errors(), row.errors) << row.name;
-        EXPECT_TRUE(reader.ShutdownThread());
+        run(reader, BulkInEndpoint, row);
+        Writer writer;
+        writer.writesWanted = 100;
+        run(writer, BulkOutEndpoint, row);
     }
 }
 
