@@ -287,6 +287,37 @@ TEST_F(UsbIoInterruptListener, ThrowsAnInterruptFromBeforeAway) {
     EXPECT_FALSE(listener->IsTouched());
 }
 
+TEST_F(UsbIoInterruptListener, ReadsForTenMillisecondsAndThenForASecondEach) {
+    std::vector<std::uint64_t> starts;
+    for (int i = 0; i < 4; ++i) {
+        driver.Script(Place, {.after = Never, .onStart = [&] { starts.push_back(ClockScheduler().Now()); }});
+    }
+    Start();
+    SleepMilliseconds(2500);
+    StopWithin(1);
+    ASSERT_EQ(starts.size(), 4U);
+    const std::uint64_t expected[] = {10'000, 1'000'000, 1'000'000};
+    for (std::size_t i = 0; i < 3; ++i) {
+        EXPECT_NEAR(static_cast<double>(starts[i + 1] - starts[i]), static_cast<double>(expected[i]),
+                    clock.IsVirtual() ? 0 : 150'000);
+    }
+    EXPECT_THAT(receiver.Codes(), IsEmpty());
+}
+
+TEST_F(UsbIoInterruptListener, SaysWhenItsThreadDoesNotReportItsStart) {
+    Script({});
+    std::atomic<bool> hasFailed = false;
+    InstallCallFilter([&](std::string_view call) {
+        return call == "SignalEvent" && !hasFailed.exchange(true) ? Errors::InvalidHandle : Errors::Success;
+    });
+    const Stopwatch watch(clock);
+    ExpectThrow<IOException>("interrupt listener thread had timeout", [this] { listener->Start(); });
+    watch.Expect(2000);
+    WaitForRead();  // it runs all the same
+    StopWithin(1);
+    EXPECT_EQ(driver.Running(Place), 0U);
+}
+
 TEST_F(UsbIoInterruptListener, TakesItsReceiverAwayOnlyAfterTheMessageUnderWay) {
     std::atomic<bool> inMessage = false;
     receiver.onMessage = [&](std::uint32_t) {

@@ -1,3 +1,5 @@
+#include <utility>
+
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
 #include "Platform/CallFilter.h"
@@ -70,6 +72,34 @@ TEST_P(Browser, ListsOverUsbIoOnlyWhatOpens) {
     three.RefuseOpen(Paths(2)[1], Errors::AccessDenied);
     const auto devices = USBBrowser::Instance()->GetDevices(0);
     EXPECT_THAT(devices, testing::ElementsAreArray(Paths(IsNative() ? 3 : 1)));
+}
+
+using NativeScan = DriverTest;
+
+TEST_F(NativeScan, PassesOverAFailedQuestionAndEndsWithTheList) {
+    const Lines paths{"native/0", "native/1", "native/2"};
+    for (std::ptrdiff_t count : {0, 1, 3}) {
+        ScriptedDriver connected(Lines(paths.begin(), paths.begin() + count));
+        const ScopedDeviceFiles inForce(connected);
+        std::ptrdiff_t scans = 0;
+        InstallCallFilter([&](std::string_view call) {
+            scans += call == "MakeList" ? 1 : 0;
+            return Errors::Success;
+        });
+        EXPECT_THAT(PellandoUSBDevice::GetAllDevices(), testing::SizeIs(count));
+        EXPECT_EQ(scans, count + 1);
+    }
+    ScriptedDriver three(paths);
+    const ScopedDeviceFiles inForce(three);
+    for (const auto& [code, found] :
+         {std::pair{Errors::InvalidData, "native/1"}, {Errors::NoMoreItems, ""}}) {
+        bool isFirst = true;
+        InstallCallFilter([&, failure = code](std::string_view call) {
+            return call == "FindInterface" && std::exchange(isFirst, false) ? failure : Errors::Success;
+        });
+        EXPECT_EQ(PellandoUSBDevice::ScanDevice(1), found);
+    }
+    InstallCallFilter({});
 }
 
 INSTANTIATE_TEST_SUITE_P(Transports, Browser, testing::Values(Transport::Native, Transport::UsbIo),

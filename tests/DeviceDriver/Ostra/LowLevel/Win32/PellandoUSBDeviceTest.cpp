@@ -265,6 +265,21 @@ TEST_F(NativeDevice, ClosesInTimeWhileAMessageWaitsForTheDeviceLock) {
     EXPECT_THAT(listener.Codes(), IsEmpty());
 }
 
+TEST_F(NativeDevice, ClosesAtOnceWhileSomebodyHoldsTheDeviceLock) {
+    auto device = Open();
+    driver.TakeTranscript();
+    Mutex mutex("native1");
+    const ScopedLock held(mutex);
+    const Stopwatch watch(clock);
+    BackgroundThread closer([&] { device.reset(); });
+    WaitUntil([&] { return closer.HasEnded(); });
+    watch.ExpectAtMost(5);
+    EXPECT_THAT(
+        driver.TakeTransfers(),
+        ElementsAre("control 220009 00 00 00 00 00 00 84 00 00 00 / 00 00 00 00 00 00 00 00",
+                    "control 220011 00 02 00 00 D0 00 03 00 00 00 / 00 00 00 00 00 00 00 00", "cancel 3"));
+}
+
 TEST(NativeDeviceName, KeepsLettersAndDigits) {
     EXPECT_EQ(PellandoUSBDevice::StripStrangeChars("\\\\?\\usb#Vid_04b4&pid_1004#5&2a#{00873FDF-61A8}.\xC4z"),
               "usbVid04b4pid100452a00873FDF61A8z");

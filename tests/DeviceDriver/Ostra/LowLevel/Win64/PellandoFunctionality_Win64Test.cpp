@@ -1,3 +1,6 @@
+#include <functional>
+#include <optional>
+
 #include "Platform/CallFilter.h"
 #include "Protocol/UsbIoDriver.h"
 #include "UsbIoTest.h"
@@ -36,6 +39,19 @@ TEST_F(UsbIoCommands, HaveTimeoutsThatDoNotWrap) {
     instrument->MeasureRequest(&byte, 1,
                                4294963);  // * 1000 + 5000 is 32 bits wide and a few milliseconds more
     EXPECT_EQ(byte, 1);
+}
+
+TEST_F(UsbIoCommands, WriteWithoutALimit) {
+    if (!clock.IsVirtual()) {
+        GTEST_SKIP() << "takes minutes in real time";
+    }
+    const auto instrument = Open();
+    driver.Script(Protocol::BulkOutEndpoint, {.after = 60'000});
+    driver.Script(Protocol::BulkOutEndpoint, {.after = 120'000});
+    const Stopwatch watch(clock);
+    const std::uint8_t byte = 7;
+    EXPECT_NO_THROW(instrument->WriteEEPROM({}, {}, &byte, 1));
+    watch.Expect(1 + 60'000 + 120'000);
 }
 
 class UsbIoOpening : public UsbIoTest {
@@ -89,6 +105,26 @@ TEST_F(UsbIoOpening, FailsWithoutTheInstrument) {
     ExpectFailure("requested device not found", 1);
     failOpen(1);
     ExpectFailure("No such device connected", 1);
+
+    const auto atTheSecondList = [](std::function<Platform::ErrorCode()> action) {
+        Platform::InstallCallFilter([=, lists = 0](std::string_view call) mutable {
+            return call == "MakeList" && ++lists == 2 ? action() : Platform::Errors::Success;
+        });
+    };
+    atTheSecondList([] { return Platform::Errors::InvalidData; });
+    ExpectFailure("Unable to create device list.", 0);
+    // All of them open, and none is the one that was listed before.
+    ScriptedDriver others({"usbio/8", "usbio/9"});
+    std::optional<Platform::ScopedDeviceFiles> inForce;
+    atTheSecondList([&] {
+        inForce.emplace(others);
+        return Platform::Errors::Success;
+    });
+    ExpectFailure("requested device not found", 0);
+    Platform::InstallCallFilter({});
+    const std::string ask = "control 8094206C / [12]";
+    EXPECT_THAT(others.TakeTranscript(),
+                ElementsAre("open usbio/8", ask, "close usbio/8", "open usbio/9", ask, "close usbio/9"));
 }
 
 TEST_F(UsbIoOpening, EachStepOfTheConfigurationCanFail) {
