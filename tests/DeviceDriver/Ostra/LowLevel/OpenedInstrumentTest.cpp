@@ -1,0 +1,95 @@
+// The command set over a simulated instrument, by either transport: messages, and where failures say they
+// passed.
+#include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
+#include "Support/DriverTest.h"
+#include "Support/SimulatedHost.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using DeviceDriver::Generic::MessageButtonData;
+using DeviceDriver::Generic::MessageDeviceGone;
+using DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
+using Platform::SleepMilliseconds;
+using Codes = std::vector<std::uint32_t>;
+
+class OpenedInstrument : public testing::TestWithParam<Transport> {
+  protected:
+    TestClock clock{TestTime::Virtual};
+    SimulatedHost host{GetParam()};
+    Simulator::SimulatedInstrument& instrument = host.Add("a");
+};
+INSTANTIATE_TEST_SUITE_P(Transports, OpenedInstrument, testing::Values(Transport::Native, Transport::UsbIo),
+                         [](const auto& parameter) { return std::string(Name(parameter.param)); });
+
+TEST_P(OpenedInstrument, SendsItsMessagesUntilTheListenerIsRemoved) {
+    const struct {
+        const char* name;
+        bool isRemoved, isPressed, isUnplugged;
+        Codes messages;
+    } cases[] = {
+        {"pressed and unplugged", false, true, true, {MessageButtonData, MessageDeviceGone}},
+        {"unplugged", false, false, true, {MessageDeviceGone}},
+        {"removed before that", true, true, true, {}},
+        {"pressed and closed", false, true, false, {MessageButtonData}},
+    };
+    for (const auto& row : cases) {
+        SCOPED_TRACE(row.name);
+        RecordingListener listener;
+        {
+            PellandoFunctionality opened(&listener, 0);
+            SleepMilliseconds(50);  // an interrupt just after the opening is thrown away
+            if (row.isRemoved) {
+                opened.removeListener(&listener);
+            }
+            if (row.isPressed) {
+                instrument.PressButton();
+                SleepMilliseconds(50);
+            }
+            if (row.isUnplugged) {
+                instrument.Unplug();
+                SleepMilliseconds(50);
+            }
+        }
+        EXPECT_EQ(listener.Codes(), row.messages);
+        instrument.PlugIn();
+    }
+}
+
+/// The operations of a trace, without namespaces and places.
+template <class Operation>
+Lines TraceOf(Operation operation) {
+    Lines operations;
+    try {
+        operation();
+        ADD_FAILURE() << "nothing thrown";
+    } catch (const IOException& exception) {
+        const std::string front = "::Varnholt::DeviceDriver::Ostra::LowLevel::";
+        for (const std::string& entry : exception.GetTrace()) {
+            EXPECT_THAT(entry, testing::StartsWith(front));
+            operations.push_back(entry.substr(front.size(), entry.find("()") - front.size()));
+        }
+    }
+    return operations;
+}
+
+TEST_P(OpenedInstrument, FailuresNameTheOperationsThatTheyLeft) {
+    const std::string transport =
+        GetParam() == Transport::Native ? "PellandoFunctionality_PC" : "PellandoFunctionality_Win64";
+    host.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 1:stall; bulk-in 0:stall"));
+    PellandoFunctionality opened(nullptr, 0);
+    std::uint8_t byte = 0;
+    const std::pair<const char*, std::function<void()>> cases[] = {
+        {"::SetMeasureMode", [&] { opened.SetMeasureMode(1); }},
+        {"::MeasureRequest", [&] { opened.MeasureRequest(&byte, 1, 1); }}};
+    for (const auto& [operation, run] : cases) {
+        Lines trace = TraceOf(run);
+        ASSERT_GT(trace.size(), 2U);
+        trace.erase(trace.begin(), trace.end() - 2);
+        EXPECT_THAT(trace, testing::ElementsAre(transport + operation,
+                                                std::string("PellandoFunctionality") + operation));
+    }
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests
