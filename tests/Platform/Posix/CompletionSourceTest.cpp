@@ -114,5 +114,35 @@ TEST_F(WorkedOffInWaits, ManyThreadsLoseNothing) {
     EXPECT_EQ(called, Threads * Rounds);
 }
 
+/// The last event is forgotten, which waits for the scheduler's thread to end, while a new one comes that is
+/// far off: neither waits for the other.
+TEST_F(WorkedOffInWaits, ForgettingDoesNotWaitForEventsThatCome) {
+    constexpr int Rounds = 2000;
+    std::atomic<int> round = 0;
+    const TestThread forgetting([&] {
+        for (int i = 1; i <= Rounds; ++i) {
+            const auto own = scheduler.CallAt(scheduler.Now() + AnHour, [] {});
+            round = i;
+            scheduler.Forget(own);
+            ASSERT_EQ(Wait(done.Get(), LongTimeout), WaitResult::Signalled) << "round " << i;
+        }
+    });
+    for (int i = 1; i <= Rounds; ++i) {
+        while (round < i) {
+            std::this_thread::yield();
+        }
+        const auto far = scheduler.CallAt(scheduler.Now() + AnHour, [] {});
+        SignalEvent(done.Get());
+        const std::uint64_t limit = scheduler.Now() + 5'000'000;
+        while (i < Rounds && round == i && scheduler.Now() < limit) {
+            std::this_thread::yield();
+        }
+        scheduler.Forget(far);
+        if (i < Rounds) {
+            ASSERT_GT(round, i) << "it waits for an event of another";
+        }
+    }
+}
+
 }  // namespace
 }  // namespace Varnholt::Platform
