@@ -178,7 +178,7 @@ TEST(Cancellation, LosesAndRepeatsNothingInAnySeededOrder) {
         round.Play();
         cutOff += round.CutOff();
     }
-    EXPECT_GT(cutOff, static_cast<int>(Rounds));
+    EXPECT_GT(cutOff, static_cast<int>(Rounds / 2)) << "hardly a read was ended in the middle of its data";
 }
 #endif
 

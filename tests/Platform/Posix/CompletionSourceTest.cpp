@@ -20,7 +20,10 @@ constexpr std::uint64_t AnHour = 3'600'000'000;
 /// events run on waiting threads anyway.
 struct WorkedOffInWaits : testing::Test {
     WorkedOffInWaits() { Posix::WorkOffInWaits({}); }
-    ~WorkedOffInWaits() override { Posix::WorkOffInWaits({}); }
+    ~WorkedOffInWaits() override {
+        Posix::WorkOffInWaits({});
+        scheduler.Forget(0);  // which sees the scheduler's thread to its end
+    }
 
     EventScheduler& scheduler = ClockScheduler();
     const OwnedHandle done{MakeAutoResetEvent()};
