@@ -82,8 +82,11 @@ class PellandoUSBDevice::Core final : public EventListener {
           write(path, NativeDriver::WritePipe, Platform::NoHandle) {}
 
     void MessageFromDevice(std::uint32_t code, std::uint32_t parameter) override {
-        const ScopedLock held(lock);
         const bool isGone = code == Generic::MessageDeviceGone;
+        if (isGone && isClosing) {
+            return;  // without the lock: whoever closes the device waits for this thread
+        }
+        const ScopedLock held(lock);
         if (!listener || isClosed || (isGone && isClosing)) {
             return;
         }
