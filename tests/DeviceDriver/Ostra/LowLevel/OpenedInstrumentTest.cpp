@@ -1,8 +1,11 @@
 // The command set over a simulated instrument, by either transport: messages, and where failures say they
 // passed.
+#include <optional>
+
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
 #include "Support/DriverTest.h"
 #include "Support/SimulatedHost.h"
+#include "Utilities/Multithreading/Mutex.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -11,6 +14,7 @@ using DeviceDriver::Generic::MessageButtonData;
 using DeviceDriver::Generic::MessageDeviceGone;
 using DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
 using Platform::SleepMilliseconds;
+using testing::ElementsAre;
 using Codes = std::vector<std::uint32_t>;
 
 class OpenedInstrument : public testing::TestWithParam<Transport> {
@@ -18,6 +22,8 @@ class OpenedInstrument : public testing::TestWithParam<Transport> {
     TestClock clock{TestTime::Virtual};
     SimulatedHost host{GetParam()};
     Simulator::SimulatedInstrument& instrument = host.Add("a");
+    const std::string transport =
+        GetParam() == Transport::Native ? "PellandoFunctionality_PC" : "PellandoFunctionality_Win64";
 };
 INSTANTIATE_TEST_SUITE_P(Transports, OpenedInstrument, testing::Values(Transport::Native, Transport::UsbIo),
                          [](const auto& parameter) { return std::string(Name(parameter.param)); });
@@ -32,6 +38,7 @@ TEST_P(OpenedInstrument, SendsItsMessagesUntilTheListenerIsRemoved) {
         {"unplugged", false, false, true, {MessageDeviceGone}},
         {"removed before that", true, true, true, {}},
         {"pressed and closed", false, true, false, {MessageButtonData}},
+        {"closed untouched", false, false, false, {}},
     };
     for (const auto& row : cases) {
         SCOPED_TRACE(row.name);
@@ -56,6 +63,21 @@ TEST_P(OpenedInstrument, SendsItsMessagesUntilTheListenerIsRemoved) {
     }
 }
 
+TEST_P(OpenedInstrument, ClosesWithoutWaitingForTheDeviceLock) {
+    RecordingListener listener;
+    std::optional<PellandoFunctionality> opened(std::in_place, &listener, 0);
+    SleepMilliseconds(50);
+    Varnholt::Utilities::Multithreading::Mutex mutex(std::string(Name(GetParam())) + "a");
+    mutex.Lock();
+    const Stopwatch watch(clock);
+    BackgroundThread closer([&] { opened.reset(); });
+    WaitUntil([&] { return closer.HasEnded(); });
+    watch.ExpectAtMost(5);
+    mutex.Unlock();
+    EXPECT_FALSE(instrument.Claimed());
+    EXPECT_EQ(listener.Codes(), Codes());
+}
+
 /// The operations of a trace, without namespaces and places.
 template <class Operation>
 Lines TraceOf(Operation operation) {
@@ -74,8 +96,6 @@ Lines TraceOf(Operation operation) {
 }
 
 TEST_P(OpenedInstrument, FailuresNameTheOperationsThatTheyLeft) {
-    const std::string transport =
-        GetParam() == Transport::Native ? "PellandoFunctionality_PC" : "PellandoFunctionality_Win64";
     host.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 1:stall; bulk-in 0:stall"));
     PellandoFunctionality opened(nullptr, 0);
     std::uint8_t byte = 0;
@@ -86,9 +106,26 @@ TEST_P(OpenedInstrument, FailuresNameTheOperationsThatTheyLeft) {
         Lines trace = TraceOf(run);
         ASSERT_GT(trace.size(), 2U);
         trace.erase(trace.begin(), trace.end() - 2);
-        EXPECT_THAT(trace, testing::ElementsAre(transport + operation,
-                                                std::string("PellandoFunctionality") + operation));
+        EXPECT_THAT(trace,
+                    ElementsAre(transport + operation, std::string("PellandoFunctionality") + operation));
     }
+}
+
+TEST_P(OpenedInstrument, AnOpeningThatFailsNamesEachOperationOnce) {
+    host.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 0:stall"));
+    const auto open = [] { PellandoFunctionality(nullptr, 0); };
+    Lines trace = TraceOf(open);
+    ASSERT_GT(trace.size(), 3U);
+    trace.erase(trace.begin(), trace.end() - 3);
+    const std::string constructor = "PellandoFunctionality::PellandoFunctionality";
+    EXPECT_THAT(trace, ElementsAre(transport + "::Reset", "PellandoFunctionality::Reset", constructor));
+
+    instrument.Unplug();
+    const std::string search =
+        transport + (GetParam() == Transport::Native ? "::GetDeviceAddress" : "::InitUSBIO");
+    EXPECT_THAT(TraceOf(open), ElementsAre(search, search, transport + "::" + transport,
+                                           "PellandoFunctionalityByte::Instance", constructor))
+        << "the place of the failure, then the operations";
 }
 
 }  // namespace
