@@ -21,8 +21,9 @@ constexpr std::uint64_t AnHour = 3'600'000'000;
 struct WorkedOffInWaits : testing::Test {
     WorkedOffInWaits() { Posix::WorkOffInWaits({}); }
     ~WorkedOffInWaits() override {
+        // Which sees the scheduler's thread to its end.
+        scheduler.Forget(scheduler.CallAt(scheduler.Now() + AnHour, [] {}));
         Posix::WorkOffInWaits({});
-        scheduler.Forget(0);  // which sees the scheduler's thread to its end
     }
 
     EventScheduler& scheduler = ClockScheduler();
