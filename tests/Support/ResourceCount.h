@@ -15,6 +15,8 @@ struct ResourceCount {
     bool operator==(const ResourceCount&) const = default;
 
     static ResourceCount Take();
+    /// Once the counts no longer change, for a few seconds at most: where calls have gone before.
+    static ResourceCount TakeSettled();
     /// Waits until the counts are these, for a few seconds at most, and answers whether they are.
     bool Settles() const;
 };
