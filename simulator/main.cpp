@@ -18,6 +18,7 @@
 #include "FreshEeprom.h"
 #include "KernelPort.h"
 #include "Platform/Usb/PcapngWriter.h"
+#include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/SimulatorBus.h"
 #include "Platform/Usb/UsbCapture.h"
 #include "PollLoop.h"
@@ -64,7 +65,7 @@ void Attach(UsbIpServer& server, const std::string& name) {
     if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
         throw std::runtime_error("no socket for the kernel");
     }
-    server.Serve(ends[0], name, "the kernel");
+    server.Serve(ends[0], name, Usb::KernelAsUser);
     try {
         const unsigned port = PlugIntoKernel(ends[1], server.Record(name).DeviceId());
         std::cout << "ready: plugged into port " << port << " of the kernel  (" << name << ")\n";

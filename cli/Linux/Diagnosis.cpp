@@ -6,6 +6,7 @@
 #include <algorithm>
 
 #include "Instrument.h"
+#include "Platform/Usb/SimulatorAddress.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -83,6 +84,9 @@ Finding JudgeSimulator(const Platform::Usb::SimulatorInfo& simulator, const Tria
                 fmt::format("is run by another user (user {}, process {}) and cannot be used",
                             simulator.userId, simulator.processId),
                 "start an ostra-simulator of your own"};
+    }
+    if (simulator.usedBy == Platform::Usb::KernelAsUser) {
+        return {Level::Note, simulator.name, "is plugged into the kernel and used as a device of its", ""};
     }
     if (!simulator.usedBy.empty()) {
         return {Level::Problem, simulator.name, "is in use by " + simulator.usedBy, EndTheOther,

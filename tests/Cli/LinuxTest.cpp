@@ -1,5 +1,6 @@
 #include "Linux/Diagnosis.h"
 #include "Linux/UdevRule.h"
+#include "Platform/Usb/SimulatorAddress.h"
 #include "ToolFixture.h"
 
 namespace Varnholt::Tests {
@@ -55,6 +56,8 @@ std::vector<Diagnosis> Diagnoses() {
     const Platform::Usb::SimulatorInfo simulator{"simulated-1", 1000, 9, true, ""};
     auto simulatorInUse = simulator;
     simulatorInUse.usedBy = "ostra (process 8)";
+    auto simulatorInKernel = simulator;
+    simulatorInKernel.usedBy = Platform::Usb::KernelAsUser;
     auto simulatorOfAnother = simulator;
     simulatorOfAnother.usable = false;
     const std::vector problem{Level::Problem};
@@ -105,6 +108,13 @@ std::vector<Diagnosis> Diagnoses() {
          "no USB device",
          "ostra-simulator",
          ExitCode::NoInstrument},
+        {"simulated, plugged into the kernel",
+         {{Plugged()}, {simulatorInKernel}},
+         {Level::Good, Level::Note},
+         "is plugged into the kernel",
+         "",
+         ExitCode::Success,
+         1},
         Usable("good", {{Plugged()}, {}}, good),
         Usable("a kernel driver", {{Plugged("cdc_acm")}, {}}, {Level::Note, Level::Good}),
         Usable("a program drives it", {{Plugged("usbfs")}, {}}, good),

@@ -13,6 +13,8 @@ inline constexpr const char* SimulatorSocketPrefix = "ostra-simulator/";
 inline constexpr const char* SimulatorBusId = "1-1";
 /// In a device record's path, in front of who has the device imported.
 inline constexpr const char* UsedByMark = ", used by ";
+/// Who has an instrument that is plugged into the kernel.
+inline constexpr const char* KernelAsUser = "the kernel";
 
 /// Letters, digits, '-', '_' and '.', at most 64 of them: a name that can stand in a device path.
 bool IsSimulatorName(const std::string& name);
