@@ -86,7 +86,7 @@ Finding JudgeSimulator(const Platform::Usb::SimulatorInfo& simulator, const Tria
                 "start an ostra-simulator of your own"};
     }
     if (simulator.usedBy == Platform::Usb::KernelAsUser) {
-        return {Level::Note, simulator.name, "is plugged into the kernel and used as a device of its", ""};
+        return {Level::Note, simulator.name, "is plugged into the kernel, which shows it as a USB device", ""};
     }
     if (!simulator.usedBy.empty()) {
         return {Level::Problem, simulator.name, "is in use by " + simulator.usedBy, EndTheOther,
