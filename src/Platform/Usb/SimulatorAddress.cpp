@@ -25,7 +25,8 @@ class Address final {
     }
 
     int MakeSocket(int (*use)(int, const sockaddr*, socklen_t)) const {
-        const int file = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+        // Never waits: a connection is there at once, or the simulator has stopped taking them.
+        const int file = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
         if (file >= 0 && use(file, reinterpret_cast<const sockaddr*>(&address), size) != 0) {
             const int error = errno;
             close(file);
@@ -63,7 +64,8 @@ bool IsTrustedUser(std::uint32_t userId) {
 
 int ListenAsSimulator(const std::string& name) {
     const int file = Address(name).MakeSocket(bind);
-    constexpr int waitingConnections = 16;
+    // Beyond them a connection fails, so these are more than come while the simulator is busy.
+    constexpr int waitingConnections = 256;
     if (file >= 0 && listen(file, waitingConnections) != 0) {
         close(file);
         return -1;

@@ -28,7 +28,8 @@ std::optional<PeerCredentials> CredentialsOfPeer(int socketFile);
 /// Whether a process of that user may be talked to: it is this process's own user, or root.
 bool IsTrustedUser(std::uint32_t userId);
 
-/// A listening (or connected) socket file for the instrument `name`; -1 with `errno` set.
+/// A listening (or connected) socket file for the instrument `name`, which does not wait; -1 with `errno`
+/// set. `EAGAIN` says that somebody listens but has not taken connections for some time.
 int ListenAsSimulator(const std::string& name);
 int ConnectToSimulator(const std::string& name);
 

@@ -98,15 +98,17 @@ std::optional<SimulatorInfo> Describe(const std::string& name) {
     return info;
 }
 
-/// The simulator writes who has opened the instrument behind its path.
-std::string UserOf(const std::string& name) {
+/// Finds out who uses it: the simulator writes who has opened the instrument behind its path.
+void AskForUser(const std::string& name, SimulatorInfo& info) {
     const auto records = ListUsbIpDevices(ConnectorTo(name));
-    if (!records || records->empty()) {
-        return {};
+    info.answers = records && !records->empty();
+    if (!info.answers) {
+        return;
     }
     const std::string& path = records->front().path;
-    const auto mark = path.find(UsedByMark);
-    return mark == std::string::npos ? std::string() : path.substr(mark + std::string(UsedByMark).size());
+    if (const auto mark = path.find(UsedByMark); mark != std::string::npos) {
+        info.usedBy = path.substr(mark + std::string(UsedByMark).size());
+    }
 }
 
 class SimulatorsOfThisUser final : public UsbBus {
@@ -145,9 +147,11 @@ std::vector<SimulatorInfo> ListSimulators() {
     for (const std::string& name : ListeningNames()) {
         if (auto info = Describe(name)) {
             if (info->usable) {
-                info->usedBy = UserOf(name);
+                AskForUser(name, *info);
             }
             simulators.push_back(std::move(*info));
+        } else if (errno == EAGAIN) {
+            simulators.push_back({.name = SimulatedPrefix + name, .answers = false});
         }
     }
     return simulators;

@@ -18,9 +18,10 @@ struct SimulatorInfo {
     int processId = 0;
     bool usable = false;  ///< false: it is another user's, and neither listed on the bus nor opened
     std::string usedBy;   ///< who has it opened, as the simulator tells; empty when nobody has
+    bool answers = true;  ///< false: it listens but does not answer; who runs it may be unknown (process 0)
 };
 
-/// All of them, ordered by name.
+/// All of them, ordered by name. One that does not answer takes a second.
 std::vector<SimulatorInfo> ListSimulators();
 
 /// The bus of the simulated instruments that run as programs of the same user.
