@@ -86,7 +86,9 @@ class FaultInjector final : public UsbDevice, private TransferClient {
           keepsData(script->Plan().Uses(FaultKind::Stale)) {}
     ~FaultInjector() override;
 
-    std::vector<EndpointInfo> Endpoints() override { return device->Endpoints(); }
+    std::vector<EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
+        return device->Endpoints(error);
+    }
     ErrorCode Claim() override { return Gone() ? Errors::DeviceNotConnected : device->Claim(); }
     void Release() override { device->Release(); }
     ErrorCode Submit(Transfer& transfer) override;

@@ -9,7 +9,9 @@ class SimulatedInstrument::Connection final : public Platform::Usb::UsbDevice {
         : instrument(std::move(connected)), attachment{instrument->Plugging()} {}
     ~Connection() override { instrument->Drop(attachment); }
 
-    std::vector<Platform::Usb::EndpointInfo> Endpoints() override { return instrument->Endpoints(); }
+    std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
+        return instrument->Endpoints(error);
+    }
     Platform::ErrorCode Claim() override { return instrument->ClaimFor(attachment); }
     void Release() override { instrument->ReleaseFor(attachment); }
     Platform::ErrorCode Submit(Platform::Usb::Transfer& transfer) override {

@@ -53,7 +53,8 @@ void SimulatedInstrument::WaitForClients() const {
     }
 }
 
-std::vector<Platform::Usb::EndpointInfo> SimulatedInstrument::Endpoints() {
+std::vector<Platform::Usb::EndpointInfo> SimulatedInstrument::Endpoints(ErrorCode& error) {
+    error = Errors::Success;
     return {Simulator::Endpoints.begin(), Simulator::Endpoints.end()};
 }
 

@@ -31,7 +31,7 @@ class SimulatedInstrument final : public Platform::Usb::UsbDevice {
     SimulatedInstrument(const SimulatedInstrument&) = delete;
     SimulatedInstrument& operator=(const SimulatedInstrument&) = delete;
 
-    std::vector<Platform::Usb::EndpointInfo> Endpoints() override;
+    std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override;
     /// Exclusive: `Errors::Busy` while it is claimed, also by the same caller.
     Platform::ErrorCode Claim() override { return ClaimFor(ownAttachment); }
     void Release() override { ReleaseFor(ownAttachment); }

@@ -107,7 +107,9 @@ TEST_F(UsbIpServerTest, InstrumentsAreListedByNameForAsLongAsTheyAreThere) {
 TEST_F(UsbIpServerTest, MemoryTravelsBothWays) {
     const auto instrument = server.Add(name);
     const auto device = Open(name);
-    const auto endpoints = device->Endpoints();
+    Platform::ErrorCode error = Errors::Busy;
+    const auto endpoints = device->Endpoints(error);
+    EXPECT_EQ(Errors::Success, error);
     ASSERT_EQ(3U, endpoints.size());
     EXPECT_EQ(BulkOutEndpoint, endpoints[0].address);
     EXPECT_FALSE(instrument->Claimed()) << "the question for the endpoints has ended its claim";
@@ -307,6 +309,24 @@ TEST_F(UsbIpServerTest, TcpOffersAllOfThem) {
     EXPECT_EQ(Errors::Busy, Open(other)->Claim()) << "one import, whichever way it came";
     EXPECT_EQ(Errors::Success, Open(name)->Claim());
     EXPECT_EQ(Errors::DeviceNotConnected, Platform::Usb::MakeUsbIpDevice(connect, "1-3")->Claim());
+}
+
+TEST_F(UsbIpServerTest, StoppedSimulatorHoldsUpNobody) {
+    const int listener = Platform::Usb::ListenAsSimulator(name);
+    ASSERT_GE(listener, 0);
+    EXPECT_TRUE(Listed(name));
+    SimulatorInfo info = Describe(name);
+    EXPECT_TRUE(info.usable);
+    EXPECT_FALSE(info.answers);
+    for (int i = 0, file = 0; i < 1000 && file >= 0; ++i) {
+        file = Platform::Usb::ConnectToSimulator(name);
+        close(file);
+    }
+    EXPECT_FALSE(Listed(name)) << "it takes no more connections";
+    info = Describe(name);
+    EXPECT_FALSE(info.usable);
+    EXPECT_FALSE(info.answers);
+    close(listener);
 }
 
 TEST_F(UsbIpServerTest, AnotherUsersSimulatorIsSeenAndNotUsed) {

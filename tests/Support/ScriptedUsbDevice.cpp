@@ -72,7 +72,11 @@ std::size_t ScriptedUsbDevice::Pending(std::uint8_t endpoint) const {
         running, endpoint, [](const Running& candidate) { return candidate.transfer->endpoint; }));
 }
 
-std::vector<Platform::Usb::EndpointInfo> ScriptedUsbDevice::Endpoints() {
+std::vector<Platform::Usb::EndpointInfo> ScriptedUsbDevice::Endpoints(Platform::ErrorCode& error) {
+    error = Get(endpointsAnswer);
+    if (error != Platform::Errors::Success) {
+        return {};
+    }
     return {{Protocol::BulkOutEndpoint, 2, 512},
             {Protocol::BulkInEndpoint, 2, 512},
             {Protocol::InterruptInEndpoint, 3, 8}};

@@ -36,6 +36,8 @@ class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
     void Unplug();
     /// What `Claim` answers from now on.
     void AnswerClaim(Platform::ErrorCode code) { Set(claimAnswer, code); }
+    /// Whether `Endpoints` succeeds from now on.
+    void AnswerEndpoints(Platform::ErrorCode code) { Set(endpointsAnswer, code); }
 
     bool IsClaimed() const { return Get(claimed); }
     bool IsOpen() const { return Get(handles) > 0; }
@@ -43,7 +45,7 @@ class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
     std::uint32_t TimesClaimed() const { return Get(timesClaimed); }
     std::size_t Pending(std::uint8_t endpoint) const;
 
-    std::vector<Platform::Usb::EndpointInfo> Endpoints() override;
+    std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override;
     Platform::ErrorCode Claim() override;
     void Release() override;
     Platform::ErrorCode Submit(Platform::Usb::Transfer& transfer) override;
@@ -96,6 +98,7 @@ class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
     std::uint32_t timesOpened = 0;
     std::uint32_t timesClaimed = 0;
     Platform::ErrorCode claimAnswer = Platform::Errors::Success;
+    Platform::ErrorCode endpointsAnswer = Platform::Errors::Success;
 };
 
 /// A bus with such devices, in the order in which they were plugged in.

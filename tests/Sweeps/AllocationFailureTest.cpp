@@ -94,7 +94,9 @@ class ExemptDevice final : public UsbDevice {
         const Exempt guard;
         device.reset();
     }
-    std::vector<Platform::Usb::EndpointInfo> Endpoints() override { return device->Endpoints(); }
+    std::vector<Platform::Usb::EndpointInfo> Endpoints(ErrorCode& error) override {
+        return device->Endpoints(error);
+    }
     ErrorCode Claim() override {
         const Exempt guard;
         return device->Claim();

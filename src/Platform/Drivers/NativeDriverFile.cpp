@@ -64,11 +64,14 @@ std::unique_ptr<NativeDriverFile> NativeDriverFile::Open(std::shared_ptr<SharedD
         device.Unclaim();
         throw;
     }
-    if (file->endpoint != 0 && !device.HasEndpoint(file->endpoint)) {
-        error = Errors::FileNotFound;
-        return nullptr;
+    if (file->endpoint != 0) {
+        bool found = false;
+        error = device.FindEndpoint(file->endpoint, found);
+        if (error == Errors::Success && !found) {
+            error = Errors::FileNotFound;
+        }
     }
-    return file;
+    return error == Errors::Success ? std::move(file) : nullptr;
 }
 
 NativeDriverFile::NativeDriverFile(std::shared_ptr<SharedDevice> shared, std::uint8_t pipeEndpoint,
@@ -112,7 +115,12 @@ Decision NativeDriverFile::Control(std::uint32_t code, std::span<const std::uint
     if (code == Native::ControlAbortPipe) {
         const std::uint16_t named = Protocol::LoadLittle16(block + Native::Block::Value);
         const auto address = static_cast<std::uint8_t>(named);
-        if (named != address || !Device().HasEndpoint(address)) {
+        bool found = false;
+        const ErrorCode unknown = Device().FindEndpoint(address, found);
+        if (unknown != Errors::Success) {
+            return Decision::Refuse(unknown);
+        }
+        if (named != address || !found) {
             return Decision::Refuse(Errors::InvalidParameter);
         }
         canceller.CancelEndpoint(Device(), address);

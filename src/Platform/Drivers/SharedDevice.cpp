@@ -53,14 +53,17 @@ bool SharedDevice::IsClaimed() {
     return claims > 0;
 }
 
-bool SharedDevice::HasEndpoint(std::uint8_t endpoint) {
+ErrorCode SharedDevice::FindEndpoint(std::uint8_t endpoint, bool& found) {
     const CriticalSection::Holder holder(setup);
+    found = false;
     if (!opened) {
-        return false;
+        return Errors::Success;
     }
-    const auto endpoints = opened->Endpoints();
-    return std::any_of(endpoints.begin(), endpoints.end(),
-                       [endpoint](const Usb::EndpointInfo& info) { return info.address == endpoint; });
+    ErrorCode error = Errors::Success;
+    const auto endpoints = opened->Endpoints(error);
+    found = std::any_of(endpoints.begin(), endpoints.end(),
+                        [endpoint](const Usb::EndpointInfo& info) { return info.address == endpoint; });
+    return Note(error);
 }
 
 ErrorCode SharedDevice::Submit(Usb::Transfer& transfer) {

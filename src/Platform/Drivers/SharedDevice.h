@@ -24,8 +24,8 @@ class SharedDevice final {
     /// block.
     void Unclaim();
     bool IsClaimed();
-    /// Whether the device, once claimed, has this endpoint.
-    bool HasEndpoint(std::uint8_t endpoint);
+    /// Finds out whether the device, once claimed, has this endpoint. May block.
+    ErrorCode FindEndpoint(std::uint8_t endpoint, bool& found);
 
     /// Hands a transfer of a claimed device to it, after clearing a halt of its endpoint.
     ErrorCode Submit(Usb::Transfer& transfer);

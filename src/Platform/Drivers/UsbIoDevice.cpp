@@ -21,6 +21,8 @@ ErrorCode UsbIoRefusalOf(ErrorCode usbCode) {
         case Errors::FileNotFound:
         case Errors::DeviceNotConnected:
             return Status::DeviceRemoved;
+        case Errors::SemaphoreTimeout:
+            return Status::TimedOut;
         case Errors::NotEnoughMemory:
             return Status::NoMemory;
         default:
@@ -89,7 +91,12 @@ ErrorCode UsbIoDevice::Bind(std::uint8_t endpoint, Binding& binding) {
     if (binding != 0) {
         return Status::AlreadyBound;
     }
-    if (!device->HasEndpoint(endpoint)) {
+    bool found = false;
+    const ErrorCode unknown = device->FindEndpoint(endpoint, found);
+    if (unknown != Errors::Success) {
+        return UsbIoRefusalOf(unknown);
+    }
+    if (!found) {
         return Status::PipeNotFound;
     }
     if (std::find(bound.begin(), bound.end(), endpoint) != bound.end()) {

@@ -13,7 +13,7 @@ namespace Varnholt::Platform::Usb {
 /// own.
 class InterceptingDevice : public UsbDevice, private TransferClient {
   public:
-    std::vector<EndpointInfo> Endpoints() override { return device->Endpoints(); }
+    std::vector<EndpointInfo> Endpoints(ErrorCode& error) override { return device->Endpoints(error); }
     ErrorCode Claim() override { return device->Claim(); }
     void Release() override { device->Release(); }
     ErrorCode ClearHalt(std::uint8_t endpoint) override { return device->ClearHalt(endpoint); }

@@ -64,7 +64,7 @@ class LibUsbDevice final : public UsbDevice {
         CloseAll(file, context, handle);
     }
 
-    std::vector<EndpointInfo> Endpoints() override;
+    std::vector<EndpointInfo> Endpoints(ErrorCode& error) override;
     ErrorCode Claim() override;
     void Release() override;
     ErrorCode Submit(Transfer& transfer) override;
@@ -98,10 +98,11 @@ void LibUsbDevice::CloseAll(int file, libusb_context* context, libusb_device_han
     close(file);
 }
 
-std::vector<EndpointInfo> LibUsbDevice::Endpoints() {
+std::vector<EndpointInfo> LibUsbDevice::Endpoints(ErrorCode& error) {
     std::vector<EndpointInfo> endpoints;
     libusb_config_descriptor* configuration = nullptr;
-    if (libusb_get_config_descriptor(libusb_get_device(handle), 0, &configuration) != LIBUSB_SUCCESS) {
+    error = ErrorFromLibUsb(libusb_get_config_descriptor(libusb_get_device(handle), 0, &configuration));
+    if (error != Errors::Success) {
         return endpoints;
     }
     if (configuration->bNumInterfaces > 0 && configuration->interface[0].num_altsetting > 0) {

@@ -74,8 +74,9 @@ class UsbDevice {
     /// Closes the device: transfers still running complete first.
     virtual ~UsbDevice() = default;
 
-    /// The endpoints of configuration 1, interface 0, alternate setting 0.
-    virtual std::vector<EndpointInfo> Endpoints() = 0;
+    /// The endpoints of configuration 1, interface 0, alternate setting 0. Empty when they cannot be found
+    /// out, with the reason in `error`.
+    virtual std::vector<EndpointInfo> Endpoints(ErrorCode& error) = 0;
 
     /// Makes the device this process's own with its only configuration and interface; `Errors::Busy` when
     /// another process has it, `Errors::AccessDenied` without permission, `Errors::DeviceNotConnected` when

@@ -27,6 +27,8 @@ constexpr auto UnlinkPatience = std::chrono::milliseconds(1000);
 constexpr auto ClosePatience = std::chrono::milliseconds(500);
 /// For what the device itself is asked on behalf of the layers above.
 constexpr auto RequestPatience = std::chrono::milliseconds(2000);
+/// A list is there by then, or not looked at.
+constexpr auto ListPatience = std::chrono::milliseconds(1000);
 
 std::unique_ptr<UsbIpSocket> Connect(const UsbIpConnector& connect, ErrorCode& error) {
     error = Errors::DeviceNotConnected;
@@ -88,6 +90,8 @@ class WaitedTransfer final : public Transfer, private TransferClient {
                 return Errors::Success;
             case TransferStatus::DeviceGone:
                 return Errors::DeviceNotConnected;
+            case TransferStatus::Cancelled:
+                return Errors::SemaphoreTimeout;
             default:
                 return Errors::GeneralFailure;
         }
@@ -111,7 +115,7 @@ class UsbIpDevice final : public UsbDevice {
         : connect(std::move(connector)), busId(std::move(id)) {}
     ~UsbIpDevice() override { Release(); }
 
-    std::vector<EndpointInfo> Endpoints() override;
+    std::vector<EndpointInfo> Endpoints(ErrorCode& error) override;
     ErrorCode Claim() override;
     void Release() override;
     ErrorCode Submit(Transfer& transfer) override;
@@ -120,7 +124,7 @@ class UsbIpDevice final : public UsbDevice {
 
   private:
     struct Running {
-        Transfer* transfer;
+        Transfer* transfer;  // null: answered while its cancellation, which is answered yet, was on its way
         std::uint32_t sequence;
         std::uint32_t unlinkSequence = 0;
         Clock::time_point unlinkLimit{};
@@ -130,7 +134,7 @@ class UsbIpDevice final : public UsbDevice {
     void Listen();
     bool HandleReply(const UsbIp::SubmitReply& reply);
     bool HandleReply(const UsbIp::UnlinkReply& reply);
-    void Complete(Transfer& transfer, TransferStatus status, std::uint32_t actualLength);
+    static void Complete(Transfer& transfer, TransferStatus status, std::uint32_t actualLength);
 
     // Called with `mutex` held.
     std::uint32_t NextSequence() { return ++lastSequence == 0 ? ++lastSequence : lastSequence; }
@@ -279,7 +283,7 @@ void UsbIpDevice::Cancel(Transfer& transfer) {
 void UsbIpDevice::LimitReceiving() {
     std::optional<Clock::time_point> limit = releaseLimit;
     for (const Running& each : running) {
-        if (each.unlinkSequence != 0 && (!limit || each.unlinkLimit < *limit)) {
+        if (each.transfer && each.unlinkSequence != 0 && (!limit || each.unlinkLimit < *limit)) {
             limit = each.unlinkLimit;
         }
     }
@@ -310,8 +314,10 @@ void UsbIpDevice::Listen() {
         status = releaseLimit ? TransferStatus::Cancelled : TransferStatus::DeviceGone;
     }
     for (const Running& each : left) {
-        each.transfer->status = status;
-        each.transfer->client->TransferCompleted(*each.transfer);
+        if (each.transfer) {
+            each.transfer->status = status;
+            each.transfer->client->TransferCompleted(*each.transfer);
+        }
     }
 }
 
@@ -320,7 +326,7 @@ bool UsbIpDevice::HandleReply(const UsbIp::SubmitReply& reply) {
     {
         const std::lock_guard lock(mutex);
         const auto found = std::ranges::find(running, reply.sequence, &Running::sequence);
-        if (found == running.end()) {
+        if (found == running.end() || !found->transfer) {
             return false;
         }
         transfer = found->transfer;
@@ -328,6 +334,16 @@ bool UsbIpDevice::HandleReply(const UsbIp::SubmitReply& reply) {
     if (reply.actualLength > transfer->length ||
         (transfer->IsIn() && !socket->Receive({transfer->data, reply.actualLength}, true))) {
         return false;
+    }
+    {
+        const std::lock_guard lock(mutex);
+        const auto found = std::ranges::find(running, reply.sequence, &Running::sequence);
+        if (found->unlinkSequence == 0) {
+            running.erase(found);
+        } else {
+            found->transfer = nullptr;
+        }
+        LimitReceiving();
     }
     Complete(*transfer, UsbIp::TransferStatusOf(reply.status), reply.actualLength);
     return true;
@@ -339,26 +355,26 @@ bool UsbIpDevice::HandleReply(const UsbIp::UnlinkReply& reply) {
         const std::lock_guard lock(mutex);
         const auto found = std::ranges::find(running, reply.sequence, &Running::unlinkSequence);
         if (found == running.end() || reply.sequence == 0) {
-            return true;  // its transfer was answered while the cancellation was on its way
+            return false;
         }
         transfer = found->transfer;
+        running.erase(found);
+        LimitReceiving();
     }
-    Complete(*transfer, TransferStatus::Cancelled, 0);
+    if (transfer) {
+        Complete(*transfer, TransferStatus::Cancelled, 0);
+    }
     return true;
 }
 
 void UsbIpDevice::Complete(Transfer& transfer, TransferStatus status, std::uint32_t actualLength) {
     transfer.status = status;
     transfer.actualLength = actualLength;
-    {
-        const std::lock_guard lock(mutex);
-        std::erase_if(running, [&](const Running& each) { return each.transfer == &transfer; });
-        LimitReceiving();
-    }
     transfer.client->TransferCompleted(transfer);
 }
 
-std::vector<EndpointInfo> UsbIpDevice::Endpoints() {
+std::vector<EndpointInfo> UsbIpDevice::Endpoints(ErrorCode& error) {
+    error = Errors::Success;
     {
         const std::lock_guard claimLock(claimMutex);
         if (!endpoints.empty()) {
@@ -368,11 +384,15 @@ std::vector<EndpointInfo> UsbIpDevice::Endpoints() {
     // The descriptors come over the connection, which there is only during a claim.
     const bool claimed = Claimed();
     std::vector<EndpointInfo> found;
-    if (claimed || Claim() == Errors::Success) {
+    if (!claimed) {
+        error = Claim();
+    }
+    if (error == Errors::Success) {
         constexpr SetupPacket getConfiguration{0x80, 6, 0x0200, 0, 255};
         std::vector<std::uint8_t> bytes(getConfiguration.length);
         WaitedTransfer transfer(getConfiguration, bytes);
-        if (transfer.Do(*this) == Errors::Success) {
+        error = transfer.Do(*this);
+        if (error == Errors::Success) {
             bytes.resize(transfer.actualLength);
             found = EndpointsOfFirstInterface(bytes);
         }
@@ -410,6 +430,7 @@ std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(const UsbIpConn
     if (!socket) {
         return std::nullopt;
     }
+    socket->ReceiveUntil(Clock::now() + ListPatience);
     const auto reply = Ask(*socket, UsbIp::Operation::ListRequest, {}, UsbIp::Operation::ListReply);
     std::array<std::uint8_t, UsbIp::ListCountSize> countBytes{};
     if (!reply || reply->status != UsbIp::OperationStatus::Ok || !socket->Receive(countBytes, true)) {

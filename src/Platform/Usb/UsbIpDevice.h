@@ -21,7 +21,8 @@ using UsbIpConnector = std::function<int(ErrorCode& error)>;
 /// treated as one whose device was unplugged.
 std::shared_ptr<UsbDevice> MakeUsbIpDevice(UsbIpConnector connect, std::string busId);
 
-/// The devices that a peer exports, from a connection of its own; nothing when it does not answer properly.
+/// The devices that a peer exports, from a connection of its own; nothing when it does not answer properly
+/// within a second.
 std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(const UsbIpConnector& connect);
 
 }  // namespace Varnholt::Platform::Usb

@@ -112,7 +112,11 @@ bool UsbIpSocket::Receive(std::span<std::uint8_t> bytes, bool inMessage) {
                 bufferStart = 0;
                 bufferEnd = static_cast<std::size_t>(received);
             }
-            patienceEnds = Clock::now() + Patience;
+            const auto now = Clock::now();
+            if (LimitIsBefore(now)) {
+                return false;  // a peer that goes on sending would never let it be waited for
+            }
+            patienceEnds = now + Patience;
             continue;
         }
         if (received < 0 && errno == EINTR) {
@@ -123,6 +127,11 @@ bool UsbIpSocket::Receive(std::span<std::uint8_t> bytes, bool inMessage) {
         }
     }
     return true;
+}
+
+bool UsbIpSocket::LimitIsBefore(Clock::time_point time) {
+    const std::lock_guard lock(mutex);
+    return limit && *limit < time;
 }
 
 UsbIpSocket::Readiness UsbIpSocket::WaitToReceive(std::optional<Clock::time_point> patienceEnds) {

@@ -38,6 +38,7 @@ class UsbIpSocket final {
 
   private:
     enum class Readiness { Ready, Lost };
+    bool LimitIsBefore(Clock::time_point time);
     Readiness WaitToReceive(std::optional<Clock::time_point> patienceEnds);
 
     const int file;

@@ -68,6 +68,9 @@ TEST_F(NativeDriver, OpenPassesOnWhyTheDeviceCannotBeHad) {
         bus.AnswerOpen(code);
         EXPECT_EQ(OpenError("native/port1"), code);
         bus.AnswerOpen(Errors::Success);
+        device->AnswerEndpoints(code);
+        EXPECT_EQ(OpenError("native/port1\\PIPE01"), code);
+        device->AnswerEndpoints(Errors::Success);
     }
     EXPECT_EQ(OpenError("native/port1"), Errors::Success);
 }

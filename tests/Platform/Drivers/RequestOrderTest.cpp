@@ -27,7 +27,10 @@ class HookedDevice final : public Platform::Usb::UsbDevice {
     std::function<void(Transfer&)> onCancel;
     int cancels = 0;
 
-    std::vector<Platform::Usb::EndpointInfo> Endpoints() override { return {{In, 2, 512}}; }
+    std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
+        error = Errors::Success;
+        return {{In, 2, 512}};
+    }
     Platform::ErrorCode Claim() override { return Errors::Success; }
     void Release() override {}
     Platform::ErrorCode Submit(Transfer& transfer) override { return onSubmit(transfer); }

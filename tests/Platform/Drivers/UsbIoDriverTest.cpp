@@ -123,7 +123,7 @@ TEST_F(UsbIoDriver, ConfiguringTellsWhyTheDeviceCannotBeHad) {
     } cases[] = {
         {Errors::Busy, Status::OpenedByOtherProcess},        {Errors::AccessDenied, Errors::AccessDenied},
         {Errors::NotEnoughMemory, Status::NoMemory},         {Errors::GeneralFailure, Status::RequestFailed},
-        {Errors::DeviceNotConnected, Status::DeviceRemoved},
+        {Errors::DeviceNotConnected, Status::DeviceRemoved}, {Errors::SemaphoreTimeout, Status::TimedOut},
     };
     for (const auto& row : cases) {
         const auto file = Open("usbio/port1");
@@ -131,6 +131,13 @@ TEST_F(UsbIoDriver, ConfiguringTellsWhyTheDeviceCannotBeHad) {
         EXPECT_EQ(Control(file, Code::SetConfiguration, ConfigurationBlock()).code, row.status) << row.code;
         EXPECT_TRUE(files->CloseFile(file));
         bus.AnswerOpen(Errors::Success);
+
+        const auto silent = Open("usbio/port1");
+        EXPECT_EQ(Control(silent, Code::SetConfiguration, ConfigurationBlock()).code, Status::Success);
+        device->AnswerEndpoints(row.code);
+        EXPECT_EQ(Control(silent, Code::BindPipe, {In}).code, row.status) << row.code;
+        device->AnswerEndpoints(Errors::Success);
+        EXPECT_TRUE(files->CloseFile(silent));
 
         const auto second = Open("usbio/port1");
         device->AnswerClaim(row.code);

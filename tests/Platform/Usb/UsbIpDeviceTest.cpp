@@ -12,6 +12,7 @@
 #include <iterator>
 #include <optional>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "Platform/Usb/UsbIpDevice.h"
@@ -196,6 +197,10 @@ TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
              Case{"leaves amid the data", [&](auto& submit) { return reply(submit.sequence, 64, 32); }, true},
              Case{"answers what was not asked",
                   [&](auto& submit) { return reply(submit.sequence + 100, 0); }},
+             Case{"answers a cancellation that there was not",
+                  [](auto& submit) {
+                      return Bytes() + UsbIp::Encode(UsbIp::UnlinkReply{submit.sequence + 100, 0});
+                  }},
              Case{"sends too much", [&](auto& submit) { return reply(submit.sequence, 65, 65); }},
              Case{"announces 4 GB", [&](auto& submit) { return reply(submit.sequence, 0xFFFFFFFF); }},
              Case{"submits to a host", [](auto& submit) { return Bytes() + UsbIp::Encode(submit); }},
@@ -286,6 +291,39 @@ TEST_F(UsbIpDeviceTest, ImportFailuresAreToldApart) {
         },
         "1-1");
     EXPECT_EQ(Errors::AccessDenied, unreachable->Claim());
+}
+
+TEST_F(UsbIpDeviceTest, EndpointsOfADeviceThatDoesNotAnswerAreNotAnEmptyList) {
+    const auto device = MakeClaimedDevice();
+    std::jthread peerThread([this] {
+        PeerReceivesPacket<UsbIp::SubmitPacket>();
+        PeerSends(
+            UsbIp::Encode(UsbIp::UnlinkReply{PeerReceivesPacket<UsbIp::UnlinkPacket>().sequence, -104}));
+    });
+    ErrorCode error = Errors::Success;
+    EXPECT_TRUE(device->Endpoints(error).empty());
+    EXPECT_EQ(Errors::SemaphoreTimeout, error);
+    peerThread.join();
+    ClosePeer();
+    EXPECT_TRUE(device->Endpoints(error).empty());
+    EXPECT_EQ(Errors::DeviceNotConnected, error);
+}
+
+TEST_F(UsbIpDeviceTest, PeerThatGoesOnSendingDoesNotHoldUpARelease) {
+    const auto device = MakeClaimedDevice();
+    TestTransfer transfer = TestTransfer::In(BulkInEndpoint, 1U << 20);
+    ASSERT_EQ(Errors::Success, device->Submit(transfer));
+    const auto submit = PeerReceivesPacket<UsbIp::SubmitPacket>();
+    const std::jthread sender([&](const std::stop_token& stop) {
+        PeerSends(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, transfer.length}));
+        for (std::uint8_t byte = 0; !stop.stop_requested() && send(peer, &byte, 1, MSG_NOSIGNAL) == 1;) {
+            usleep(1000);
+        }
+    });
+    const auto start = Clock::now();
+    device->Release();
+    EXPECT_LT(Clock::now() - start, std::chrono::seconds(3));
+    EXPECT_EQ(TransferStatus::Cancelled, transfer.status);
 }
 
 TEST_F(UsbIpDeviceTest, ReleaseEndsTransfersAndLeavesNothingBehind) {
