@@ -151,7 +151,9 @@ std::vector<SimulatorInfo> ListSimulators() {
             }
             simulators.push_back(std::move(*info));
         } else if (errno == EAGAIN) {
-            simulators.push_back({.name = SimulatedPrefix + name, .answers = false});
+            SimulatorInfo& silent = simulators.emplace_back();
+            silent.name = SimulatedPrefix + name;
+            silent.answers = false;
         }
     }
     return simulators;
