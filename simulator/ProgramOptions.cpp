@@ -3,6 +3,8 @@
 #include <CLI/Config.hpp>
 #include <CLI/Formatter.hpp>
 #include <CLI/Validators.hpp>
+#include <cmath>
+#include <cstdlib>
 #include <stdexcept>
 
 #include "FaultPlan.h"
@@ -61,6 +63,16 @@ std::string FaultHelp() {
     return text + "\n";
 }
 
+/// A range lets "nan" pass, which is neither below nor above it.
+std::string RefuseNan(const std::string& text) {
+    return std::isnan(std::strtod(text.c_str(), nullptr)) ? "\"" + text + "\" is no number" : "";
+}
+
+/// It would be taken for a very large number.
+std::string RefuseNegative(const std::string& text) {
+    return text.starts_with('-') ? text + " is negative" : "";
+}
+
 }  // namespace
 
 void DefineOptions(CLI::App& program, ProgramOptions& options) {
@@ -81,23 +93,27 @@ void DefineOptions(CLI::App& program, ProgramOptions& options) {
         .add_option("--firmware", options.firmware, "old: one measurement mode; new: three to choose from")
         ->check(CLI::IsMember({"old", "new"}))
         ->capture_default_str();
-    program.add_option("--seed", options.seed, "of the noise")->capture_default_str();
+    program.add_option("--seed", options.seed, "of the noise")->check(RefuseNegative)->capture_default_str();
     program.add_option("--light", options.light, "brightness of the lamp; 0 is dark")
         ->check(CLI::Range(0.0, 1e6))
+        ->check(RefuseNan)
         ->capture_default_str();
     program.add_option("--gain", options.gain, "of the sensor's amplifier")
         ->check(CLI::Range(0.0, 1e6))
+        ->check(RefuseNan)
         ->capture_default_str();
     program
         .add_option_function<double>(
             "--rate", [&](double rate) { options.bytesPerSecond = static_cast<std::uint64_t>(rate); },
             "bytes per second of readouts and scans, such as 53e6; without it, as fast as can be")
         ->check(CLI::Range(1.0, 1e12))
+        ->check(RefuseNan)
         ->type_name("BYTES");
     program.add_flag("--integrate", options.takesIntegrationTime, "a readout takes its integration time");
     auto* const bytes = program
                             .add_option("--scan-bytes", options.scanBytes,
                                         "bytes that a measurement streams to a host that reads on")
+                            ->check(RefuseNegative)
                             ->capture_default_str();
     program.add_option("--scan-records", options.scanRecords, "the same in readouts of 256 bytes")
         ->check(CLI::Range(std::uint64_t{1}, std::uint64_t{1} << 48))
@@ -107,6 +123,7 @@ void DefineOptions(CLI::App& program, ProgramOptions& options) {
     program.add_option("--faults", options.faults, "make transfers fail; see below")->type_name("PLAN");
     program.add_option("--for", options.seconds, "end by itself after so long")
         ->check(CLI::Range(0.0, 1e9))
+        ->check(RefuseNan)
         ->type_name("SECONDS");
     program
         .add_option("--tcp", options.tcpPort,
