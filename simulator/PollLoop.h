@@ -12,7 +12,7 @@ namespace Varnholt::Simulator {
 
 /// Waits for files and for points in time, and calls whoever asked for them, on the thread of `Run`. To be
 /// used from that thread only.
-class PollLoop final : public Platform::EventScheduler {
+class PollLoop : public Platform::EventScheduler {
   public:
     std::uint64_t Now() override;
     EventId CallAt(std::uint64_t time, std::function<void()> event) override;

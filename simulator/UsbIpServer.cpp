@@ -179,6 +179,7 @@ class UsbIpServer::Connection final {
     void Abandon() {
         abandoned = true;
         server.loop.Forget(flush);
+        server.loop.Forget(deadline);
         server.loop.Unwatch(file);
     }
 
@@ -195,6 +196,24 @@ class UsbIpServer::Connection final {
             watchedFor = events;
             server.loop.Watch(file, events, [this] { Ready(); });
         }
+        if (deadline == 0 && session->PeerIsDue()) {
+            CheckPeerAt(server.loop.Now() + Patience);
+        }
+    }
+
+    void CheckPeerAt(std::uint64_t time) {
+        deadline = server.loop.CallAt(time, [this] {
+            deadline = 0;
+            if (!session->PeerIsDue()) {
+                return;
+            }
+            if (lastMoved + Patience > server.loop.Now()) {
+                CheckPeerAt(lastMoved + Patience);
+                return;
+            }
+            server.Tell(peerText + ": silent for too long");
+            server.Remove(*this);
+        });
     }
 
     /// Not from inside the session, which is busy.
@@ -214,6 +233,7 @@ class UsbIpServer::Connection final {
                 server.Remove(*this);
                 return;
             }
+            lastMoved = server.loop.Now();
             inputStart = 0;
             inputEnd = static_cast<std::size_t>(std::max<ssize_t>(count, 0));
         }
@@ -247,10 +267,14 @@ class UsbIpServer::Connection final {
             if (count < 0 && errno != EINTR) {
                 return errno == EAGAIN;
             }
+            lastMoved = server.loop.Now();
             session->OutputSent(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
         }
         return true;
     }
+
+    /// A peer that is due and moves no byte for so long is given up: it would keep its connection for ever.
+    static constexpr std::uint64_t Patience = 5'000'000;
 
     UsbIpServer& server;
     const int file;
@@ -262,6 +286,8 @@ class UsbIpServer::Connection final {
     std::size_t inputStart = 0;
     std::size_t inputEnd = 0;
     Platform::EventScheduler::EventId flush = 0;
+    Platform::EventScheduler::EventId deadline = 0;
+    std::uint64_t lastMoved = 0;  // when bytes went either way
     short watchedFor = -1;
     bool abandoned = false;
 };

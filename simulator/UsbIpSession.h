@@ -54,6 +54,10 @@ class UsbIpSession final : private Platform::Usb::TransferClient {
     /// Why it ended, for a log; empty while it runs and when it ended as it should.
     const std::string& Complaint() const { return complaint; }
     bool Imported() const { return device != nullptr; }
+    /// Whether the peer has to go on soon: it may only be silent between two messages after an import.
+    bool PeerIsDue() const {
+        return over || !Imported() || !input.empty() || next == &UsbIpSession::SubmitPacket;
+    }
 
   private:
     struct Urb;

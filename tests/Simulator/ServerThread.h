@@ -60,10 +60,19 @@ class ServerThread final {
         eventfd_write(wake, 1);
         done.get();
     }
+    /// Lets the server's time jump.
+    void Advance(std::uint64_t microseconds) {
+        Do([&] { loop.ahead += microseconds; });
+    }
     UsbIpServer& Server() { return *server; }
     PollLoop& Loop() { return loop; }
 
   private:
+    struct AdvancedLoop final : PollLoop {
+        std::uint64_t Now() override { return PollLoop::Now() + ahead; }
+        std::uint64_t ahead = 0;
+    };
+
     void DoTasks() {
         eventfd_t count = 0;
         eventfd_read(wake, &count);
@@ -78,7 +87,7 @@ class ServerThread final {
     }
 
     const int wake;
-    PollLoop loop;
+    AdvancedLoop loop;
     std::unique_ptr<UsbIpServer> server;
     std::mutex mutex;  // guards `tasks`
     std::vector<std::packaged_task<void()>> tasks;

@@ -280,6 +280,58 @@ TEST_F(UsbIpServerTest, PeersWithOddMannersDoNoHarm) {
     EXPECT_EQ(before, countFiles());
 }
 
+TEST_F(UsbIpServerTest, PeerThatStopsWhereItIsDueIsGivenUp) {
+    const auto instrument = server.Add(name);
+    const auto operation =
+        UsbIp::Encode(UsbIp::OperationHeader{UsbIp::ProtocolVersion, UsbIp::Operation::ImportRequest, {}});
+    const auto busId = UsbIp::EncodeBusId(Platform::Usb::SimulatorBusId);
+    Bytes import(operation.begin(), operation.end());
+    import.insert(import.end(), busId.begin(), busId.end());
+    UsbIp::SubmitPacket submit;
+    submit.sequence = 1;
+    submit.length = 8;
+    submit.endpoint = BulkOutEndpoint;
+    const auto packet = UsbIp::Encode(submit);
+    const auto imported = [&](std::size_t size) {
+        Bytes bytes = import;
+        bytes.insert(bytes.end(), packet.begin(), packet.begin() + static_cast<std::ptrdiff_t>(size));
+        return bytes;
+    };
+    struct Case {
+        const char* name;
+        Bytes sent;
+        bool mayStay;
+    };
+    for (const Case& test : {
+             Case{"sends nothing", {}, false},
+             Case{"amid an operation", Bytes(import.begin(), import.begin() + 3), false},
+             Case{"amid an import", Bytes(import.begin(), import.begin() + 8), false},
+             Case{"amid a packet", imported(47), false},
+             Case{"before a payload", imported(48), false},
+             Case{"after an import", imported(0), true},
+         }) {
+        const int file = Platform::Usb::ConnectToSimulator(name);
+        ASSERT_GE(file, 0);
+        const auto isOpen = [&] {
+            Bytes bytes(1000);
+            ssize_t count = 1;
+            for (int i = 0; i < 50 && count != 0; ++i) {
+                usleep(1000);
+                count = recv(file, bytes.data(), bytes.size(), MSG_DONTWAIT);
+            }
+            return count != 0;
+        };
+        send(file, test.sent.data(), test.sent.size(), MSG_NOSIGNAL);
+        EXPECT_TRUE(isOpen()) << test.name;
+        server.Advance(4'000'000);
+        EXPECT_TRUE(isOpen()) << test.name;
+        server.Advance(2'000'000);
+        EXPECT_EQ(test.mayStay, isOpen()) << test.name;
+        close(file);
+        server.Advance(0);
+    }
+}
+
 TEST_F(UsbIpServerTest, TcpOffersAllOfThem) {
     const std::string other = ServerThread::UniqueName("b");
     server.Add(name);
