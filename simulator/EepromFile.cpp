@@ -90,10 +90,7 @@ EepromFile::EepromFile(PollLoop& pollLoop, std::string name, Log logger)
     : loop(pollLoop), fileName(std::move(name)), log(std::move(logger)) {}
 
 EepromFile::~EepromFile() {
-    if (saving != 0) {
-        loop.Forget(saving);
-        Save();
-    }
+    loop.Forget(saving);
 }
 
 bool EepromFile::Exists() const {
@@ -104,6 +101,7 @@ bool EepromFile::Exists() const {
 void EepromFile::Keep(std::shared_ptr<SimulatedInstrument> kept) {
     instrument = std::move(kept);
     if (!Exists()) {
+        unsaved = true;
         Save();
     }
 }
@@ -111,14 +109,24 @@ void EepromFile::Keep(std::shared_ptr<SimulatedInstrument> kept) {
 void EepromFile::MemoryChanged() {
     // An image comes in many pieces.
     constexpr std::uint64_t delay = 100'000;
+    unsaved = true;
     if (saving == 0) {
         saving = loop.CallAt(loop.Now() + delay, [this] { Save(); });
     }
 }
 
+bool EepromFile::Finish() {
+    if (unsaved && instrument) {
+        loop.Forget(saving);
+        Save();
+    }
+    return !unsaved;
+}
+
 void EepromFile::Save() {
     saving = 0;
-    if (instrument && !ReplaceFile(fileName, instrument->Eeprom()) && log) {
+    unsaved = !ReplaceFile(fileName, instrument->Eeprom());
+    if (unsaved && log) {
         log("cannot write " + fileName + ": " + std::strerror(errno));
     }
 }

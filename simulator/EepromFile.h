@@ -30,6 +30,8 @@ class EepromFile final {
     void Keep(std::shared_ptr<SimulatedInstrument> kept);
     /// To be told by the instrument.
     void MemoryChanged();
+    /// Writes what is not written yet; false when that cannot be done, either.
+    bool Finish();
 
   private:
     void Save();
@@ -39,6 +41,7 @@ class EepromFile final {
     const Log log;
     std::shared_ptr<SimulatedInstrument> instrument;
     Platform::EventScheduler::EventId saving = 0;
+    bool unsaved = false;
 };
 
 }  // namespace Varnholt::Simulator

@@ -4,6 +4,7 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <csignal>
 #include <exception>
 #include <iostream>
@@ -59,21 +60,22 @@ int BlockedStopSignals() {
     return signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK);
 }
 
-/// Plugs an instrument into the kernel, by a socket whose other end is the server's.
-void Attach(UsbIpServer& server, const std::string& name) {
+/// Plugs an instrument into the kernel, by a socket whose other end, which is answered, is to be served.
+int Attach(UsbIpServer& server, const std::string& name) {
     int ends[2] = {-1, -1};
     if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
         throw std::runtime_error("no socket for the kernel");
     }
-    server.Serve(ends[0], name, Usb::KernelAsUser);
     try {
         const unsigned port = PlugIntoKernel(ends[1], server.Record(name).DeviceId());
         std::cout << "ready: plugged into port " << port << " of the kernel  (" << name << ")\n";
     } catch (...) {
+        close(ends[0]);
         close(ends[1]);
         throw;
     }
     close(ends[1]);
+    return ends[0];
 }
 
 void Run(const ProgramOptions& options) {
@@ -87,7 +89,7 @@ void Run(const ProgramOptions& options) {
         throw std::runtime_error("more --eeprom files than instruments");
     }
     const FaultPlan faults = FaultPlan::Parse(options.faults);
-    std::optional<Usb::PcapngWriter> capture;  // made last: nothing is emptied for options that are wrong
+    std::optional<Usb::PcapngWriter> capture;  // made last: nothing is emptied by a start that fails
     std::vector<std::unique_ptr<EepromFile>> files;
     UsbIpServer server(loop, log);
     for (std::size_t i = 0; i < names.size(); ++i) {
@@ -114,16 +116,19 @@ void Run(const ProgramOptions& options) {
             file->Keep(instrument);
         }
     }
+    const std::uint16_t port = options.tcpPort ? server.ListenTcp(*options.tcpPort) : 0;
+    std::vector<int> kernelSockets;
+    for (std::size_t i = 0; options.attach && i < names.size(); ++i) {
+        kernelSockets.push_back(Attach(server, names[i]));
+    }
     if (!options.captureFile.empty()) {
         capture.emplace(options.captureFile, "ostra-simulator");
         if (capture->Failed()) {
             throw std::runtime_error("cannot write " + options.captureFile);
         }
     }
-    if (options.attach) {
-        for (const std::string& name : names) {
-            Attach(server, name);
-        }
+    for (std::size_t i = 0; i < kernelSockets.size(); ++i) {
+        server.Serve(kernelSockets[i], names[i], Usb::KernelAsUser);
     }
 
     const int stopSignals = BlockedStopSignals();
@@ -132,7 +137,6 @@ void Run(const ProgramOptions& options) {
         loop.CallAt(loop.Now() + static_cast<std::uint64_t>(options.seconds * 1e6), [&loop] { loop.Stop(); });
     }
     if (options.tcpPort) {
-        const std::uint16_t port = server.ListenTcp(*options.tcpPort);
         for (const std::string& name : names) {
             std::cout << "ready: usbip --tcp-port " << port << " attach -r 127.0.0.1 -b "
                       << server.Record(name).busId << "  (" << name << ")\n";
@@ -147,6 +151,10 @@ void Run(const ProgramOptions& options) {
     close(stopSignals);
     if (capture && capture->Failed()) {
         complain(options.captureFile + " is incomplete");
+    }
+    const auto unsaved = std::ranges::count_if(files, [](const auto& file) { return !file->Finish(); });
+    if (unsaved > 0) {
+        throw std::runtime_error("what was written to the EEPROM is lost");
     }
 }
 

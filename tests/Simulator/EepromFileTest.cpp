@@ -1,6 +1,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <memory>
 #include <stdexcept>
 #include <string>
@@ -62,6 +63,7 @@ TEST_F(EepromFileTest, MemoryIsThereAgainAfterARestart) {
         RunLoopFor(300'000);
         EXPECT_EQ(43, ReadEepromFile(fileName)[8]) << "and is written while the program runs";
         WriteByte(*instrument, 9, 44);
+        EXPECT_TRUE(file.Finish());
     }
     EepromFile file(loop, fileName, log);
     const auto instrument = MakeInstrument(file);
@@ -99,6 +101,10 @@ TEST_F(EepromFileTest, FailureToWriteIsToldAndKeepsTheOldFile) {
     file.Keep(instrument);
     ASSERT_EQ(1U, complaints.size());
     EXPECT_THAT(complaints.front(), HasSubstr("cannot write"));
+    EXPECT_FALSE(file.Finish());
+    std::filesystem::create_directory(folder.Path("missing"));
+    EXPECT_TRUE(file.Finish()) << "it was kept";
+    EXPECT_EQ(FreshEeprom(), ReadEepromFile(folder.Path("missing/eeprom.bin")));
 }
 
 }  // namespace
