@@ -4,7 +4,6 @@
 #include <signal.h>
 
 #include <algorithm>
-#include <array>
 #include <condition_variable>
 #include <mutex>
 #include <new>
@@ -14,7 +13,6 @@
 
 #include "Platform/Usb/UsbDescriptors.h"
 #include "Platform/Usb/UsbIpSocket.h"
-#include "Protocol/ByteOrder.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
@@ -27,42 +25,6 @@ constexpr auto UnlinkPatience = std::chrono::milliseconds(1000);
 constexpr auto ClosePatience = std::chrono::milliseconds(500);
 /// For what the device itself is asked on behalf of the layers above.
 constexpr auto RequestPatience = std::chrono::milliseconds(2000);
-/// A list is there by then, or not looked at.
-constexpr auto ListPatience = std::chrono::milliseconds(1000);
-
-std::unique_ptr<UsbIpSocket> Connect(const UsbIpConnector& connect, ErrorCode& error) {
-    error = Errors::DeviceNotConnected;
-    const int file = connect(error);
-    return file < 0 ? nullptr : std::make_unique<UsbIpSocket>(file);
-}
-
-/// Sends an operation's request and receives the header of its reply.
-std::optional<UsbIp::OperationHeader> Ask(UsbIpSocket& socket, UsbIp::Operation request,
-                                          std::span<const std::uint8_t> argument, UsbIp::Operation reply) {
-    UsbIp::OperationHeader header;
-    header.operation = request;
-    UsbIp::OperationBytes bytes = UsbIp::Encode(header);
-    if (!socket.Send(bytes, argument) || !socket.Receive(bytes, true)) {
-        return std::nullopt;
-    }
-    header = UsbIp::DecodeOperation(bytes);
-    return header.operation == reply ? std::optional(header) : std::nullopt;
-}
-
-ErrorCode ErrorOfImport(UsbIp::OperationStatus status) {
-    switch (status) {
-        case UsbIp::OperationStatus::Ok:
-            return Errors::Success;
-        case UsbIp::OperationStatus::NotAvailable:
-        case UsbIp::OperationStatus::Busy:
-            return Errors::Busy;
-        case UsbIp::OperationStatus::NoDevice:
-            return Errors::DeviceNotConnected;
-        case UsbIp::OperationStatus::Failed:
-            break;
-    }
-    return Errors::GeneralFailure;
-}
 
 /// A transfer of the device's own, waited for.
 class WaitedTransfer final : public Transfer, private TransferClient {
@@ -130,7 +92,6 @@ class UsbIpDevice final : public UsbDevice {
         Clock::time_point unlinkLimit{};
     };
 
-    ErrorCode Import(UsbIpSocket& newSocket);
     void Listen();
     bool HandleReply(const UsbIp::SubmitReply& reply);
     bool HandleReply(const UsbIp::UnlinkReply& reply);
@@ -166,11 +127,11 @@ ErrorCode UsbIpDevice::Claim() {
         return connected ? Errors::Success : Errors::DeviceNotConnected;
     }
     ErrorCode error = Errors::Success;
-    std::unique_ptr<UsbIpSocket> newSocket = Connect(connect, error);
+    std::unique_ptr<UsbIpSocket> newSocket = ConnectUsbIp(connect, error);
     if (!newSocket) {
         return error;
     }
-    if (error = Import(*newSocket); error != Errors::Success) {
+    if (error = ImportUsbIpDevice(*newSocket, busId, deviceId); error != Errors::Success) {
         return error;
     }
     socket = std::move(newSocket);
@@ -194,23 +155,6 @@ ErrorCode UsbIpDevice::Claim() {
     }
     pthread_sigmask(SIG_SETMASK, &before, nullptr);
     return error;
-}
-
-ErrorCode UsbIpDevice::Import(UsbIpSocket& newSocket) {
-    const UsbIp::BusIdBytes id = UsbIp::EncodeBusId(busId);
-    const auto reply = Ask(newSocket, UsbIp::Operation::ImportRequest, id, UsbIp::Operation::ImportReply);
-    if (!reply) {
-        return Errors::DeviceNotConnected;
-    }
-    if (reply->status != UsbIp::OperationStatus::Ok) {
-        return ErrorOfImport(reply->status);
-    }
-    UsbIp::DeviceRecordBytes bytes{};
-    if (!newSocket.Receive(bytes, true)) {
-        return Errors::DeviceNotConnected;
-    }
-    deviceId = UsbIp::DecodeDeviceRecord(bytes).DeviceId();
-    return Errors::Success;
 }
 
 void UsbIpDevice::Release() {
@@ -421,38 +365,6 @@ ErrorCode UsbIpDevice::ClearHalt(std::uint8_t endpoint) {
 
 std::shared_ptr<UsbDevice> MakeUsbIpDevice(UsbIpConnector connect, std::string busId) {
     return std::make_shared<UsbIpDevice>(std::move(connect), std::move(busId));
-}
-
-std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(const UsbIpConnector& connect) {
-    constexpr std::uint32_t mostDevices = 256;
-    ErrorCode error = Errors::Success;
-    const auto socket = Connect(connect, error);
-    if (!socket) {
-        return std::nullopt;
-    }
-    socket->ReceiveUntil(Clock::now() + ListPatience);
-    const auto reply = Ask(*socket, UsbIp::Operation::ListRequest, {}, UsbIp::Operation::ListReply);
-    std::array<std::uint8_t, UsbIp::ListCountSize> countBytes{};
-    if (!reply || reply->status != UsbIp::OperationStatus::Ok || !socket->Receive(countBytes, true)) {
-        return std::nullopt;
-    }
-    const std::uint32_t count = Protocol::LoadBig32(countBytes.data());
-    if (count > mostDevices) {
-        return std::nullopt;
-    }
-    std::vector<UsbIp::DeviceRecord> records;
-    for (std::uint32_t i = 0; i < count; ++i) {
-        UsbIp::DeviceRecordBytes bytes{};
-        if (!socket->Receive(bytes, true)) {
-            return std::nullopt;
-        }
-        records.push_back(UsbIp::DecodeDeviceRecord(bytes));
-        std::vector<std::uint8_t> interfaces(records.back().interfaces * UsbIp::InterfaceRecordSize);
-        if (!socket->Receive(interfaces, true)) {
-            return std::nullopt;
-        }
-    }
-    return records;
 }
 
 }  // namespace Varnholt::Platform::Usb

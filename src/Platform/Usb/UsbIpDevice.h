@@ -1,28 +1,17 @@
 #pragma once
 
-#include <functional>
 #include <memory>
-#include <optional>
 #include <string>
-#include <vector>
 
 #include "Platform/Usb/UsbDevice.h"
-#include "Platform/Usb/UsbIpProtocol.h"
+#include "Platform/Usb/UsbIpOperations.h"
 
 namespace Varnholt::Platform::Usb {
-
-/// Makes a connection to the peer that exports a device: a connected stream socket, which the caller takes
-/// over, or -1 with the reason in `error`.
-using UsbIpConnector = std::function<int(ErrorCode& error)>;
 
 /// The device with the bus id `busId` that a USB/IP peer exports. It is imported when it is claimed, and the
 /// connection lasts as long as the claim; so does the thread that reads from it. A peer that closes the
 /// connection, breaks the protocol, stops in the middle of a message or leaves a cancellation unanswered is
 /// treated as one whose device was unplugged.
 std::shared_ptr<UsbDevice> MakeUsbIpDevice(UsbIpConnector connect, std::string busId);
-
-/// The devices that a peer exports, from a connection of its own; nothing when it does not answer properly
-/// within a second.
-std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(const UsbIpConnector& connect);
 
 }  // namespace Varnholt::Platform::Usb

@@ -1,0 +1,99 @@
+#include "Platform/Usb/UsbIpOperations.h"
+
+#include <array>
+#include <span>
+
+#include "Protocol/ByteOrder.h"
+
+namespace Varnholt::Platform::Usb {
+namespace {
+
+/// A list is there by then, or not looked at.
+constexpr auto ListPatience = std::chrono::milliseconds(1000);
+
+/// Sends an operation's request and receives the header of its reply.
+std::optional<UsbIp::OperationHeader> Ask(UsbIpSocket& socket, UsbIp::Operation request,
+                                          std::span<const std::uint8_t> argument, UsbIp::Operation reply) {
+    UsbIp::OperationHeader header;
+    header.operation = request;
+    UsbIp::OperationBytes bytes = UsbIp::Encode(header);
+    if (!socket.Send(bytes, argument) || !socket.Receive(bytes, true)) {
+        return std::nullopt;
+    }
+    header = UsbIp::DecodeOperation(bytes);
+    return header.operation == reply ? std::optional(header) : std::nullopt;
+}
+
+ErrorCode ErrorOfImport(UsbIp::OperationStatus status) {
+    switch (status) {
+        case UsbIp::OperationStatus::Ok:
+            return Errors::Success;
+        case UsbIp::OperationStatus::NotAvailable:
+        case UsbIp::OperationStatus::Busy:
+            return Errors::Busy;
+        case UsbIp::OperationStatus::NoDevice:
+            return Errors::DeviceNotConnected;
+        case UsbIp::OperationStatus::Failed:
+            break;
+    }
+    return Errors::GeneralFailure;
+}
+
+}  // namespace
+
+std::unique_ptr<UsbIpSocket> ConnectUsbIp(const UsbIpConnector& connect, ErrorCode& error) {
+    error = Errors::DeviceNotConnected;
+    const int file = connect(error);
+    return file < 0 ? nullptr : std::make_unique<UsbIpSocket>(file);
+}
+
+ErrorCode ImportUsbIpDevice(UsbIpSocket& socket, const std::string& busId, std::uint32_t& deviceId) {
+    const UsbIp::BusIdBytes id = UsbIp::EncodeBusId(busId);
+    const auto reply = Ask(socket, UsbIp::Operation::ImportRequest, id, UsbIp::Operation::ImportReply);
+    if (!reply) {
+        return Errors::DeviceNotConnected;
+    }
+    if (reply->status != UsbIp::OperationStatus::Ok) {
+        return ErrorOfImport(reply->status);
+    }
+    UsbIp::DeviceRecordBytes bytes{};
+    if (!socket.Receive(bytes, true)) {
+        return Errors::DeviceNotConnected;
+    }
+    deviceId = UsbIp::DecodeDeviceRecord(bytes).DeviceId();
+    return Errors::Success;
+}
+
+std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(const UsbIpConnector& connect) {
+    constexpr std::uint32_t mostDevices = 256;
+    ErrorCode error = Errors::Success;
+    const auto socket = ConnectUsbIp(connect, error);
+    if (!socket) {
+        return std::nullopt;
+    }
+    socket->ReceiveUntil(UsbIpSocket::Clock::now() + ListPatience);
+    const auto reply = Ask(*socket, UsbIp::Operation::ListRequest, {}, UsbIp::Operation::ListReply);
+    std::array<std::uint8_t, UsbIp::ListCountSize> countBytes{};
+    if (!reply || reply->status != UsbIp::OperationStatus::Ok || !socket->Receive(countBytes, true)) {
+        return std::nullopt;
+    }
+    const std::uint32_t count = Protocol::LoadBig32(countBytes.data());
+    if (count > mostDevices) {
+        return std::nullopt;
+    }
+    std::vector<UsbIp::DeviceRecord> records;
+    for (std::uint32_t i = 0; i < count; ++i) {
+        UsbIp::DeviceRecordBytes bytes{};
+        if (!socket->Receive(bytes, true)) {
+            return std::nullopt;
+        }
+        records.push_back(UsbIp::DecodeDeviceRecord(bytes));
+        std::vector<std::uint8_t> interfaces(records.back().interfaces * UsbIp::InterfaceRecordSize);
+        if (!socket->Receive(interfaces, true)) {
+            return std::nullopt;
+        }
+    }
+    return records;
+}
+
+}  // namespace Varnholt::Platform::Usb
