@@ -16,6 +16,7 @@
 #include <vector>
 
 #include "Platform/Usb/UsbIpDevice.h"
+#include "Platform/Usb/UsbIpSocket.h"
 #include "Support/TestTransfer.h"
 
 namespace Varnholt::Platform::Usb {
@@ -309,23 +310,6 @@ TEST_F(UsbIpDeviceTest, EndpointsOfADeviceThatDoesNotAnswerAreNotAnEmptyList) {
     EXPECT_EQ(Errors::DeviceNotConnected, error);
 }
 
-TEST_F(UsbIpDeviceTest, PeerThatGoesOnSendingDoesNotHoldUpARelease) {
-    const auto device = MakeClaimedDevice();
-    TestTransfer transfer = TestTransfer::In(BulkInEndpoint, 1U << 20);
-    ASSERT_EQ(Errors::Success, device->Submit(transfer));
-    const auto submit = PeerReceivesPacket<UsbIp::SubmitPacket>();
-    const std::jthread sender([&](const std::stop_token& stop) {
-        PeerSends(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, transfer.length}));
-        for (std::uint8_t byte = 0; !stop.stop_requested() && send(peer, &byte, 1, MSG_NOSIGNAL) == 1;) {
-            usleep(1000);
-        }
-    });
-    const auto start = Clock::now();
-    device->Release();
-    EXPECT_LT(Clock::now() - start, std::chrono::seconds(3));
-    EXPECT_EQ(TransferStatus::Cancelled, transfer.status);
-}
-
 TEST_F(UsbIpDeviceTest, ReleaseEndsTransfersAndLeavesNothingBehind) {
     const std::size_t threads = CountEntries("/proc/self/task");
     const std::size_t files = CountEntries("/proc/self/fd");
@@ -340,6 +324,19 @@ TEST_F(UsbIpDeviceTest, ReleaseEndsTransfersAndLeavesNothingBehind) {
     ClosePeer();
     EXPECT_EQ(threads, CountEntries("/proc/self/task"));
     EXPECT_EQ(files, CountEntries("/proc/self/fd"));
+}
+
+TEST(UsbIpSocketTest, PeerThatGoesOnSendingDoesNotOutlastTheLimit) {
+    int files[2] = {-1, -1};
+    ASSERT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, files));
+    UsbIpSocket socket(files[0]);
+    Bytes bytes(3);
+    EXPECT_EQ(2, send(files[1], bytes.data(), 2, 0));
+    EXPECT_TRUE(socket.Receive(std::span(bytes).first(1), false));
+    socket.ReceiveUntil(Clock::now() - std::chrono::seconds(1));
+    EXPECT_EQ(3, send(files[1], bytes.data(), 3, 0));
+    EXPECT_FALSE(socket.Receive(bytes, false));
+    close(files[1]);
 }
 
 TEST(UsbIpListTest, ListsAreReadWithinTheirBounds) {
