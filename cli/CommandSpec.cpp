@@ -1,9 +1,35 @@
 #include "CommandSpec.h"
 
+#include <fmt/format.h>
+
+#include <charconv>
 #include <CLI/CLI.hpp>
+#include <limits>
 #include <utility>
 
+#include "Number.h"
+
 namespace Varnholt::Cli {
+namespace {
+
+/// The option's numbers are read as all numbers of a command line: the parser itself would take a leading
+/// zero for octal.
+template <class Integer>
+CLI::Option* OfIntegers(CLI::Option* option) {
+    return option->transform(CLI::Validator(
+        [](std::string& text) -> std::string {
+            std::uint64_t number = 0;
+            if (!ParseNumber(text, std::numeric_limits<Integer>::max(), number)) {
+                return fmt::format("'{}' is no whole number up to {}", text,
+                                   std::numeric_limits<Integer>::max());
+            }
+            text = std::to_string(number);
+            return {};
+        },
+        ""));
+}
+
+}  // namespace
 
 // The checks have no words of their own in the help: the option's text says it.
 
@@ -33,8 +59,16 @@ OptionSpec& OptionSpec::Needs(const char* name) {
 }
 
 OptionSpec& OptionSpec::Between(double lowest, double highest) {
-    option->check(CLI::Range(lowest, highest).description(""));
-    return *this;
+    return Check([lowest, highest](const std::string& text) -> std::string {
+        double value = 0;
+        const char* const end = text.data() + text.size();
+        const auto parsed = std::from_chars(text.data(), end, value);
+        // What is no number at all ("nan") is in no range.
+        if (parsed.ec == std::errc() && parsed.ptr == end && value >= lowest && value <= highest) {
+            return {};
+        }
+        return fmt::format("Value {} not in range {:.12g} to {:.12g}", text, lowest, highest);
+    });
 }
 
 OptionSpec& OptionSpec::OneOf(const std::vector<std::string>& values) {
@@ -58,38 +92,38 @@ CommandSpec CommandSpec::AddGroup(const char* name, const char* about) {
 }
 
 template <class Target>
-OptionSpec CommandSpec::AddOption(const char* names, Target& target, const char* about) {
+CLI::Option* CommandSpec::AddOption(const char* names, Target& target, const char* about) {
     CLI::Option* const option = command->add_option(names, target, about);
     if (option->get_positional()) {
         option->type_name("");  // its name says what it is
     }
-    return OptionSpec(option);
+    return option;
 }
 
 OptionSpec CommandSpec::Add(const char* names, std::string& target, const char* about) {
-    return AddOption(names, target, about).Check([](const std::string& text) {
+    return OptionSpec(AddOption(names, target, about)).Check([](const std::string& text) {
         return std::string(text.empty() ? "is empty" : "");
     });
 }
 
 OptionSpec CommandSpec::Add(const char* names, double& target, const char* about) {
-    return AddOption(names, target, about);
+    return OptionSpec(AddOption(names, target, about));
 }
 
 OptionSpec CommandSpec::Add(const char* names, std::uint16_t& target, const char* about) {
-    return AddOption(names, target, about);
+    return OptionSpec(OfIntegers<std::uint16_t>(AddOption(names, target, about)));
 }
 
 OptionSpec CommandSpec::Add(const char* names, std::uint32_t& target, const char* about) {
-    return AddOption(names, target, about);
+    return OptionSpec(OfIntegers<std::uint32_t>(AddOption(names, target, about)));
 }
 
 OptionSpec CommandSpec::Add(const char* names, std::vector<std::string>& target, const char* about) {
-    return AddOption(names, target, about);
+    return OptionSpec(AddOption(names, target, about));
 }
 
 OptionSpec CommandSpec::Add(const char* names, std::vector<std::uint16_t>& target, const char* about) {
-    return AddOption(names, target, about);
+    return OptionSpec(OfIntegers<std::uint16_t>(AddOption(names, target, about)));
 }
 
 OptionSpec CommandSpec::AddFlag(const char* names, bool& target, const char* about) {

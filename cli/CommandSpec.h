@@ -60,7 +60,7 @@ class CommandSpec final {
 
   private:
     template <class Target>
-    OptionSpec AddOption(const char* names, Target& target, const char* about);
+    CLI::Option* AddOption(const char* names, Target& target, const char* about);
 
     CLI::App* command;
 };

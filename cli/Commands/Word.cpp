@@ -6,6 +6,7 @@
 #include "Commands/CommonOptions.h"
 #include "Memory/ImageEdit.h"
 #include "Memory/MemoryTarget.h"
+#include "Number.h"
 #include "Output/Json.h"
 #include "Output/Table.h"
 #include "Protocol/PropertyIdentifiers.h"

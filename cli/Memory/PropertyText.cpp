@@ -2,11 +2,13 @@
 
 #include <fmt/format.h>
 
+#include <algorithm>
 #include <charconv>
 #include <cmath>
 #include <limits>
 
 #include "Failure.h"
+#include "Number.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -23,14 +25,15 @@ std::size_t ElementsOf(const Property& value) {
     return value.SizeOf() / Property::ElementSize;
 }
 
+/// Blanks around an element are not part of it; one inside stays, and makes it no number.
 std::vector<std::string> SplitAtCommas(const std::string& text) {
-    std::vector<std::string> parts(1);
-    for (const char c : text) {
-        if (c == ',') {
-            parts.emplace_back();
-        } else if (c != ' ') {
-            parts.back() += c;
-        }
+    std::vector<std::string> parts;
+    for (std::size_t at = 0; at <= text.size();) {
+        const std::size_t comma = std::min(text.find(',', at), text.size());
+        const std::string part = text.substr(at, comma - at);
+        const std::size_t first = std::min(part.find_first_not_of(' '), part.size());
+        parts.push_back(part.substr(first, part.find_last_not_of(' ') + 1 - first));
+        at = comma + 1;
     }
     return parts;
 }
@@ -128,14 +131,6 @@ Property ParseValue(const Assignment& assignment, const Property& pattern) {
         value.AssignInternal(numbers, pattern.GetType());
     }
     return value;
-}
-
-bool ParseNumber(const std::string& text, std::uint64_t limit, std::uint64_t& number) {
-    const bool isHexadecimal = text.starts_with("0x") || text.starts_with("0X");
-    const char* const first = text.data() + (isHexadecimal ? 2 : 0);
-    const char* const end = text.data() + text.size();
-    const auto parsed = std::from_chars(first, end, number, isHexadecimal ? 16 : 10);
-    return parsed.ec == std::errc() && parsed.ptr == end && number <= limit;
 }
 
 }  // namespace Varnholt::Cli

@@ -30,7 +30,4 @@ std::vector<Assignment> ParseAssignments(const std::vector<std::string>& texts);
 /// `ExitCode::Usage` where it does not fit. Integers may be written as 0x..., floats must be finite.
 Property ParseValue(const Assignment& assignment, const Property& pattern);
 
-/// A whole number of at most `limit`, decimal or 0x...; nothing else may stand around it.
-bool ParseNumber(const std::string& text, std::uint64_t limit, std::uint64_t& number);
-
 }  // namespace Varnholt::Cli

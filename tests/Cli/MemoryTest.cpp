@@ -91,7 +91,8 @@ TEST(PropertyTextTest, AssignmentsKeepTypeAndNumberOfElements) {
              Case{"1=0xFFFFFFFF", oneLong, "-1"},
              Case{"0x3E8=0x10", oneLong, "16"},
              Case{"65535=0.1, -1e-3", twoFloats, "0.1, -0.001"},
-             Case{"1=3,4", twoFloats, "3, 4"},
+             Case{"1= 3 ,4 ", twoFloats, "3, 4"},
+             Case{"1=010", oneLong, "10"},
          }) {
         EXPECT_EQ(TextOf(ParseValue(ParseAssignment(row.text), row.pattern)), row.result) << row.text;
     }
@@ -99,7 +100,7 @@ TEST(PropertyTextTest, AssignmentsKeepTypeAndNumberOfElements) {
         FailureOf([text] { ParseAssignment(text); });
     }
     for (const char* text : {"1=5,6", "1=2147483648", "1=-2147483649", "1=5x", "1=1.5", "1=0x", "1=--5",
-                             "1=0x100000000", "1= "}) {
+                             "1=0x100000000", "1= ", "1=1 5"}) {
         FailureOf([&] { ParseValue(ParseAssignment(text), oneLong); });
     }
     for (const char* text : {"1=5", "1=1,2,3", "1=nan,1", "1=1,inf", "1=1e39,0", "1=1;2", "1=,"}) {
