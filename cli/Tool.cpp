@@ -61,10 +61,13 @@ FailureReport ReportOf(const CLI::App& app, const CLI::ParseError& error) {
         }
     }
     if (!command->get_subcommands({}).empty()) {
-        // The parser only misses a command where there is one that it does not know.
-        const std::vector<std::string> unknown = command->remaining();
-        message = unknown.empty() ? "a command is missing behind `" + name + "`"
-                                  : "`" + name + "` has no command '" + unknown.front() + "'";
+        // The parser only misses a command where there is one that it does not know, and leaves that to the
+        // tool itself.
+        const std::vector<std::string> unknown = app.remaining();
+        const auto word =
+            std::ranges::find_if(unknown, [](const std::string& text) { return !text.starts_with('-'); });
+        message = word == unknown.end() ? "a command is missing behind `" + name + "`"
+                                        : "`" + name + "` has no command '" + *word + "'";
     }
     return {ExitCode::Usage, message, "`" + name + " --help` tells more"};
 }

@@ -21,25 +21,27 @@ namespace Ids = Protocol::PropertyIds;
 struct Meaning {
     std::uint16_t id;
     const char* text;
-    bool isSettable;
+    std::int32_t highest;  ///< that can be set; 0: nothing can
 };
+constexpr std::int32_t ByMode = 1;  // how far a time is counted depends on the mode
 constexpr std::array Meanings{
-    Meaning{Ids::IntegrationTime, "integration time, seconds", true},
-    Meaning{Ids::SecondTime, "second time, seconds", true},
-    Meaning{Ids::ThirdParameter, "third parameter, at most 256", true},
-    Meaning{Ids::FlagBit0, "flag, bit 0", true},
-    Meaning{Ids::FlagBit1, "flag, bit 1", true},
-    Meaning{Ids::FlagBit2, "flag, bit 2", true},
-    Meaning{Ids::FlagBit3, "flag, bit 3", true},
-    Meaning{Ids::ThirdParameterReplacement, "in the place of 2010, with 2008", true},
-    Meaning{Ids::FifthParameter, "fifth parameter", false},
-    Meaning{Ids::Misc1, "MISC m1", false},
-    Meaning{Ids::Misc2, "MISC m2", false},
-    Meaning{Ids::Misc3, "MISC m3", false},
-    Meaning{Ids::Misc4, "MISC m4", false},
-    Meaning{Ids::Misc5, "MISC m5", false},
-    Meaning{Ids::FirstOfMisc2, "from MISC m2", false},
-    Meaning{Ids::SecondOfMisc2, "from MISC m2", false},
+    Meaning{Ids::IntegrationTime, "integration time, seconds", ByMode},
+    Meaning{Ids::SecondTime, "second time, seconds", ByMode},
+    Meaning{Ids::ThirdParameter, "third parameter, at most 256", 256},
+    Meaning{Ids::FlagBit0, "flag, bit 0", 1},
+    Meaning{Ids::FlagBit1, "flag, bit 1", 1},
+    Meaning{Ids::FlagBit2, "flag, bit 2", 1},
+    Meaning{Ids::FlagBit3, "flag, bit 3", 1},
+    Meaning{Ids::ThirdParameterReplacement, "in the place of 2010, with 2008",
+            std::numeric_limits<std::uint16_t>::max()},
+    Meaning{Ids::FifthParameter, "fifth parameter", 0},
+    Meaning{Ids::Misc1, "MISC m1", 0},
+    Meaning{Ids::Misc2, "MISC m2", 0},
+    Meaning{Ids::Misc3, "MISC m3", 0},
+    Meaning{Ids::Misc4, "MISC m4", 0},
+    Meaning{Ids::Misc5, "MISC m5", 0},
+    Meaning{Ids::FirstOfMisc2, "from MISC m2", 0},
+    Meaning{Ids::SecondOfMisc2, "from MISC m2", 0},
 };
 
 const Meaning* MeaningOf(std::uint16_t id) {
@@ -79,20 +81,22 @@ struct SetOptions {
     bool json = false;
 };
 
-/// Refuses what the instrument would take for something else: it knows no signs, and counts in 16 bits.
-void CheckSign(const Assignment& assignment, const Property& value) {
+/// Refuses what the instrument would take for something else: it knows no signs, and what has fewer bits or a
+/// limit would be cut off without a word.
+void CheckRange(const Assignment& assignment, const Property& value, std::int32_t highest) {
     const bool isTime = assignment.id == Ids::IntegrationTime || assignment.id == Ids::SecondTime;
     if (isTime ? value.AsFloat() < 0 : value.AsLong() < 0) {
         throw ToolFailure(ExitCode::BadData, fmt::format("{}={}: the instrument knows no negative numbers",
                                                          assignment.id, assignment.value));
     }
+    if (!isTime && value.AsLong() > highest) {
+        throw ToolFailure(ExitCode::BadData, fmt::format("{}={}: at most {} can be sent", assignment.id,
+                                                         assignment.value, highest));
+    }
 }
 
 void CheckReplacement(const RamAccess::Properties& set) {
     const std::int32_t replacement = set.GetProperty(Ids::ThirdParameterReplacement).AsLong();
-    if (replacement > std::numeric_limits<std::uint16_t>::max()) {
-        throw ToolFailure(ExitCode::BadData, fmt::format("9189={}: at most 65535 can be sent", replacement));
-    }
     if (replacement > 0 && set.GetProperty(Ids::FlagBit0).AsLong() == 0) {
         throw ToolFailure(ExitCode::Usage, "9189 takes the place of 2010 only together with 2008=1",
                           fmt::format("ostra ram set 9189={} 2008=1", replacement));
@@ -104,12 +108,12 @@ RamAccess::Properties Changed(const RamAccess::Properties& loaded,
     auto set = loaded;
     for (const Assignment& assignment : assignments) {
         const Meaning* const meaning = MeaningOf(assignment.id);
-        if (meaning == nullptr || !meaning->isSettable) {
+        if (meaning == nullptr || meaning->highest == 0) {
             throw ToolFailure(ExitCode::Usage, fmt::format("{} cannot be set", assignment.id),
                               "2000, 2001, 2002, 2003, 2008, 2009, 2010 and 9189 can");
         }
         const Property value = ParseValue(assignment, set.GetProperty(assignment.id));
-        CheckSign(assignment, value);
+        CheckRange(assignment, value, meaning->highest);
         set.SetProperty(assignment.id, value);
     }
     CheckReplacement(set);

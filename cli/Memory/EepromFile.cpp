@@ -18,8 +18,13 @@ std::vector<std::uint8_t> ReadFileUpTo(const std::string& name, std::size_t limi
         throw ToolFailure(ExitCode::File, "cannot read " + name + ": " + why);
     };
     std::error_code error;
-    if (std::filesystem::is_directory(name, error)) {
+    const std::filesystem::file_status status = std::filesystem::status(name, error);
+    if (std::filesystem::is_directory(status)) {
         fail("it is a directory");
+    }
+    // Opening a pipe would wait for somebody who writes into it.
+    if (std::filesystem::exists(status) && !std::filesystem::is_regular_file(status)) {
+        fail("it is no ordinary file");
     }
     errno = 0;
     std::ifstream file(name, std::ios::binary);

@@ -54,7 +54,18 @@ AtomicFile::~AtomicFile() {
     }
 }
 
+void AtomicFile::Flush() {
+    if (stream) {
+        errno = 0;
+        stream.flush();
+    }
+    if (!stream) {  // it may have failed before: then the reason is still that of the write
+        Fail(ReasonOfLastFailure());
+    }
+}
+
 void AtomicFile::Commit() {
+    Flush();
     errno = 0;
     stream.close();
     if (!stream) {

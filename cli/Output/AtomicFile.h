@@ -23,6 +23,8 @@ class AtomicFile final {
     AtomicFile& operator=(const AtomicFile&) = delete;
 
     std::ostream& Stream() { return stream; }
+    /// What has been written is with the operating system; throws where it does not take it.
+    void Flush();
     /// Returns when the content is on the disk under its name.
     void Commit();
 

@@ -186,6 +186,9 @@ TEST_P(MemoryCommandsTest, OnlySaneImagesAreWritten) {
     EXPECT_EQ(tool.Run({"eeprom", "write", image, "--force"}), ExitCode::BadData)
         << "no force makes it an image";
     Fail({"eeprom", "write", folder.Path("missing")}, ExitCode::File);
+#if !defined(_WIN32)
+    Fail({"eeprom", "write", "/dev/null"}, ExitCode::File, "it is no ordinary file");
+#endif
 }
 
 /// Wherever a write fails, the tool says how to undo it, and that works.
@@ -412,7 +415,8 @@ TEST_P(RamTest, RefusesWhatCannotBeSet) {
     for (const char* assignment : {"2012=1", "2021=1", "2005=1", "1211=1", "2009=x", "2010=1,2", "2009"}) {
         EXPECT_EQ(tool.Run({"ram", "set", assignment}), ExitCode::Usage) << assignment;
     }
-    for (const char* assignment : {"2009=-1", "2001=-0.1", "2010=-1", "9189=65536"}) {
+    for (const char* assignment :
+         {"2009=-1", "2001=-0.1", "2010=-1", "2010=257", "2010=70000", "2000=2", "9189=65536"}) {
         EXPECT_EQ(tool.Run({"ram", "set", assignment}), ExitCode::BadData) << assignment;
     }
 }

@@ -10,6 +10,7 @@
 #include "Output/Plot.h"
 #include "Output/Progress.h"
 #include "Output/Table.h"
+#include "Support/ExpectThrow.h"
 #include "ToolFixture.h"
 
 namespace Varnholt::Tests {
@@ -177,6 +178,11 @@ TEST_F(AtomicFileTest, ALinkStaysAndADeviceIsWrittenTo) {
     EXPECT_EQ(ReadFile(path), after);
     WriteFileAtomically("/dev/null", after);
     EXPECT_TRUE(std::filesystem::is_character_file("/dev/null"));
+    for (const std::size_t size : {std::size_t{2}, std::size_t{100'000}}) {  // either way through a buffer
+        ExpectThrow<ToolFailure>("cannot write /dev/full: No space left on device", [size] {
+            WriteFileAtomically("/dev/full", std::vector<std::uint8_t>(size));
+        });
+    }
 }
 #endif
 
