@@ -36,10 +36,7 @@ void Session::CarryOut() {
     interruption.SetAction([this] { files->Interrupt(); });
     interruption.ThrowIfRequested();  // one that came before
     action();
-    where.out.flush();
-    if (!where.out) {
-        throw ToolFailure(ExitCode::File, "the output cannot be written");
-    }
+    FlushOut();
     if (recording) {
         recording->Check();
     }
@@ -57,6 +54,13 @@ std::string Session::Paint(const char* color, const std::string& text) const {
 
 void Session::Print(const nlohmann::ordered_json& value) {
     PrintJson(where.out, value);
+}
+
+void Session::FlushOut() {
+    where.out.flush();
+    if (!where.out) {
+        throw ToolFailure(ExitCode::File, "the output cannot be written");
+    }
 }
 
 void Session::Note(const std::string& text) {

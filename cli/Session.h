@@ -38,6 +38,8 @@ class Session final {
     std::ostream& Out() { return where.out; }
     const StreamFacts& OutFacts() const { return where.outFacts; }
     void Print(const nlohmann::ordered_json& value);
+    /// What is in `Out` is on its way; throws where it cannot be written.
+    void FlushOut();
 
     /// Messages, on standard error.
     void Note(const std::string& text);

@@ -60,7 +60,7 @@ void Monitor(Session& session, const Options& options) {
             } else {
                 session.Out() << fmt::format("{:9.3f} s  {}\n", seconds, event);
             }
-            session.Out().flush();
+            session.FlushOut();
         }
         const std::uint32_t elapsed = Platform::TickCount() - start;
         const bool isOver = options.seconds > 0 && elapsed >= options.seconds * 1000;
@@ -78,7 +78,7 @@ void AddMonitor(CommandSpec app, Session& session) {
         "monitor", "print a line each time that the button is pressed, and when the instrument is removed");
     command.Add("--for", options->seconds, "end after this many seconds (default: with Ctrl-C)")
         .Type("SECONDS")
-        .Between(0.0, 1e6);
+        .Between(0.001, 1e6);
     AddInstrumentOptions(command, options->instrument);
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, Monitor);

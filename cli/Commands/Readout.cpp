@@ -57,6 +57,22 @@ void PrintTable(std::ostream& out, const Values& values) {
     }
 }
 
+/// How long it is since it was made: longer than the platform's count of milliseconds goes, as long as it is
+/// asked before that has gone round.
+class ElapsedTime final {
+  public:
+    std::uint64_t Milliseconds() {
+        const std::uint32_t now = Platform::TickCount();
+        elapsed += now - last;
+        last = now;
+        return elapsed;
+    }
+
+  private:
+    std::uint32_t last = Platform::TickCount();
+    std::uint64_t elapsed = 0;
+};
+
 /// Writes readouts in the form that the user asked for.
 class Writer final {
   public:
@@ -93,13 +109,28 @@ class Writer final {
         } else {
             WriteForReaders(out, readout.number, values);
         }
-        out.flush();
+        file ? file->Flush() : session.FlushOut();
     }
 
     void Finish() {
         if (file) {
             file->Commit();
         }
+    }
+
+    /// While a failure is being handled that ends the readouts after so many: those go into the file, and the
+    /// failure goes on as one that says so.
+    void FinishEarly(std::uint32_t taken) {
+        if (!file || taken == 0) {
+            return;
+        }
+        const FailureReport failure = session.Explain(std::current_exception());
+        file->Commit();
+        throw ToolFailure(failure.code,
+                          fmt::format("{}; {} written to {}", failure.message,
+                                      taken == 1 ? "1 readout was" : fmt::format("{} readouts were", taken),
+                                      options.output),
+                          failure.advice);
     }
 
   private:
@@ -129,39 +160,55 @@ class Writer final {
     std::optional<AtomicFile> file;
 };
 
-void TakeReadouts(Session& session, const Options& options) {
-    if (int{options.json} + int{options.csv} + int{options.plot} + int{options.raw} > 1) {
-        throw ToolFailure(ExitCode::Usage, "--json, --csv, --plot and --raw exclude each other");
+/// Waits until it is due, so many milliseconds after the first, and takes it.
+Readout Take(Session& session, Instrument& instrument, std::uint32_t number, std::uint64_t due,
+             ElapsedTime& time) {
+    const std::uint64_t elapsed = time.Milliseconds();
+    if (!session.UserInterruption().Sleep(static_cast<std::uint32_t>(due > elapsed ? due - elapsed : 0))) {
+        session.UserInterruption().ThrowIfRequested();
     }
+    Readout readout{number, static_cast<double>(time.Milliseconds()) / 1000, {}};
+    instrument.Commands().MeasureRequest(readout.bytes.data(), Protocol::ReadoutBytes,
+                                         Interface::FixedReadout::Timeout);
+    return readout;
+}
+
+void TakeAll(Session& session, const Options& options) {
     Instrument instrument(session, options.instrument);
     Writer writer(session, options, instrument.Identifier());
     PrepareMeasurement(session, instrument, options.measurement);
-    const bool isEndless = options.repeat == 0;
-    const auto interval = static_cast<std::uint32_t>(options.interval * 1000);
-    const std::uint32_t start = Platform::TickCount();
-    for (std::uint32_t number = 1; isEndless || number <= options.repeat; ++number) {
-        // The interval is from start to start, so that it does not drift.
-        const std::uint32_t due = (number - 1) * interval;
-        const std::uint32_t elapsed = Platform::TickCount() - start;
-        if (!session.UserInterruption().Sleep(due > elapsed ? due - elapsed : 0)) {
-            if (isEndless) {
-                break;  // the only end that it has
-            }
-            session.UserInterruption().ThrowIfRequested();
-        }
-        Readout readout{number, (Platform::TickCount() - start) / 1000.0, {}};
+    const auto interval = static_cast<std::uint64_t>(options.interval * 1000);
+    ElapsedTime time;
+    for (std::uint32_t taken = 0; options.repeat == 0 || taken < options.repeat; ++taken) {
+        Readout readout{};
         try {
-            instrument.Commands().MeasureRequest(readout.bytes.data(), Protocol::ReadoutBytes,
-                                                 Interface::FixedReadout::Timeout);
+            // The interval is from start to start, so that it does not drift.
+            readout = Take(session, instrument, taken + 1, taken * interval, time);
         } catch (...) {
-            if (isEndless && session.UserInterruption().IsRequested()) {
-                break;
-            }
+            writer.FinishEarly(taken);
             throw;
         }
         writer.Write(readout);
     }
     writer.Finish();
+}
+
+void TakeReadouts(Session& session, const Options& options) {
+    if (int{options.json} + int{options.csv} + int{options.plot} + int{options.raw} > 1) {
+        throw ToolFailure(ExitCode::Usage, "--json, --csv, --plot and --raw exclude each other");
+    }
+    try {
+        TakeAll(session, options);
+    } catch (...) {
+        const FailureReport end = session.Explain(std::current_exception());
+        if (options.repeat != 0 || end.code != ExitCode::Interrupted) {
+            throw;
+        }
+        // The only end that it has. Whoever wants a file is told what is in it.
+        if (!options.output.empty()) {
+            session.Note(end.message);
+        }
+    }
 }
 
 }  // namespace

@@ -1,6 +1,7 @@
 #include <fmt/format.h>
 #include <fmt/ostream.h>
 
+#include <limits>
 #include <optional>
 
 #include "Commands/Commands.h"
@@ -11,6 +12,7 @@
 #include "Output/Json.h"
 #include "Platform/Time.h"
 #include "Protocol/Instrument.h"
+#include "Utilities/Tools/Win32/SystemHelperWin.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -131,10 +133,19 @@ std::uint32_t TotalOf(const Options& options) {
         throw ToolFailure(ExitCode::Usage, "records of an odd number of bytes hold no 16-bit values",
                           "an even --record-size, or --raw");
     }
+    // Its driver drops a last record that is not whole.
+    if (!Utilities::Tools::Is64BitOS() && total % options.recordSize != 0) {
+        throw ToolFailure(
+            ExitCode::Usage,
+            fmt::format("over the transport native --total is a multiple of --record-size: {} is none of {}",
+                        total, options.recordSize),
+            "another --total or --record-size, or --transport usbio");
+    }
     return static_cast<std::uint32_t>(total);
 }
 
 void Scan(Session& session, const Options& options) {
+    session.UseTransport(options.instrument.transport);
     const std::uint32_t total = TotalOf(options);
     if (options.raw && options.output.empty()) {
         if (session.OutFacts().isTerminal) {
@@ -190,8 +201,15 @@ void AddScan(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
     CommandSpec command = app.AddCommand(
         "scan", "stream records: a fixed number of them, or until the instrument stops; Ctrl-C ends it");
-    command.Add("--total", options->total, "bytes to read").Type("BYTES");
-    command.Add("--records", options->records, "records to read").Type("N").Excludes("--total");
+    command
+        .Add("--total", options->total,
+             "bytes to read; over the transport native a multiple of --record-size")
+        .Type("BYTES")
+        .Between(1, std::numeric_limits<std::uint32_t>::max());
+    command.Add("--records", options->records, "records to read")
+        .Type("N")
+        .Between(1, std::numeric_limits<std::uint32_t>::max())
+        .Excludes("--total");
     command.Add("--record-size", options->recordSize, "bytes of a record, 1 to 6553 (default: 256)")
         .Type("BYTES")
         .Between(1, LongestRecord);

@@ -99,12 +99,66 @@ TEST_P(InstrumentCommandsTest, ReadoutPlotsInTheCharactersOfTheTerminal) {
 
 TEST_P(InstrumentCommandsTest, ReadoutRepeatsFromStartToStart) {
     host.Add("sim", Leisurely());
-    Succeed({"readout", "--json", "--repeat", "3", "--interval", "2"});
-    ASSERT_EQ(tool.Lines().size(), 3u);
-    for (int i = 0; i < 3; ++i) {
-        const auto line = nlohmann::json::parse(tool.Lines()[static_cast<std::size_t>(i)]);
-        EXPECT_EQ(line["readout"], i + 1);
-        EXPECT_NEAR(line["seconds"], 2.0 * i, clock.IsVirtual() ? 0.01 : 0.5);
+    struct Case {
+        const char* repeat;
+        const char* interval;
+    };
+    // The second is longer than 32 bits count milliseconds.
+    for (const Case& row : {Case{"3", "2"}, Case{"52", "86400"}}) {
+        Succeed({"readout", "--json", "--repeat", row.repeat, "--interval", row.interval});
+        const auto lines = tool.Lines();
+        ASSERT_EQ(lines.size(), std::stoul(row.repeat));
+        for (std::size_t i = 0; i < lines.size(); ++i) {
+            const auto line = nlohmann::json::parse(lines[i]);
+            EXPECT_EQ(line["readout"], i + 1);
+            EXPECT_NEAR(line["seconds"], std::stod(row.interval) * static_cast<double>(i), 0.01);
+        }
+    }
+}
+
+/// A failure and Ctrl-C alike; before the first readout there is nothing to keep.
+TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
+    struct Case {
+        const char* repeat;
+        const char* faults;
+        std::uint64_t interruptedAt;  ///< microseconds, a second of them before the first readout
+        ExitCode code;
+        const char* text;
+        std::ptrdiff_t lines;
+    };
+    for (const Case& row : {
+             Case{"5", "bulk-in 2:stall", 90'000'000, ExitCode::InputOutput, "; 2 readouts were written", 3},
+             Case{"5", "", 2'500'000, ExitCode::Interrupted, "interrupted; 2 readouts were written", 3},
+             Case{"0", "", 1'500'000, ExitCode::Success, "interrupted; 1 readout was written", 2},
+             Case{"0", "", 500'000, ExitCode::Success, "interrupted\n", 0},
+             Case{"5", "bulk-in 0:stall", 90'000'000, ExitCode::InputOutput, "", 0},
+         }) {
+        SCOPED_TRACE(row.text);
+        host.Add("sim", Leisurely());
+        SetFaults(row.faults);
+        Cli::Interruption interruption;
+        tool.interruption = &interruption;
+        const auto event = After(row.interruptedAt, [&] { interruption.Request(); });
+        Fail({"readout", "--csv", "--repeat", row.repeat, "--interval", "1", "--output", folder.Path("csv")},
+             row.code, row.text);
+        Platform::ClockScheduler().Forget(event);
+        const auto content = row.lines > 0 ? ReadFile(folder.Path("csv")) : std::vector<std::uint8_t>();
+        EXPECT_EQ(std::count(content.begin(), content.end(), '\n'), row.lines);
+        EXPECT_EQ(std::filesystem::remove(folder.Path("csv")), row.lines > 0);
+        EXPECT_EQ(folder.Files().size(), 0u);
+    }
+}
+
+TEST_P(InstrumentCommandsTest, OutputThatCannotBeWrittenEndsACommandAtOnce) {
+    auto& instrument = host.Add("sim");
+    tool.CloseOut();
+    for (const Arguments& command : std::vector<Arguments>{
+             {"readout", "--csv", "--repeat", "60", "--interval", "1"}, {"monitor", "--for", "60"}}) {
+        const Stopwatch watch(clock);
+        const auto event = After(500'000, [&] { instrument.PressButton(); });
+        Fail(command, ExitCode::File, "the output cannot be written");
+        watch.ExpectAtMost(5000);
+        Platform::ClockScheduler().Forget(event);
     }
 }
 
@@ -139,9 +193,9 @@ TEST_P(InstrumentCommandsTest, Identify) {
 
 TEST_P(InstrumentCommandsTest, ResetSendsItsCodeAfterTheOneOfTheOpening) {
     auto& instrument = host.Add("sim");
-    Succeed({"reset", "--code", "7"});
+    Succeed({"reset", "--code", "017"});
     instrument.WithCommands([](const Simulator::Commands& commands) {
-        EXPECT_EQ(commands.lastResetCode, 7);
+        EXPECT_EQ(commands.lastResetCode, 17) << "a leading zero means nothing";
         EXPECT_EQ(commands.resets, 2u);
     });
     Fail({"reset", "--code", "256"}, ExitCode::Usage);
@@ -254,6 +308,11 @@ TEST(CommandLineTest, UsageErrorsGoToStandardError) {
              {"readout", "--parameters", "1,2,3,256"},
              {"readout", "--parameters", "1,2,3,4", "--integration-time", "1"},
              {"readout", "--integration-time", "0"},
+             {"readout", "--integration-time", "nan"},
+             {"readout", "--interval", "nan"},
+             {"monitor", "--for", "0"},
+             {"scan", "--records", "0"},
+             {"scan", "--total", "0"},
              {"scan", "--record-size", "6554"},
              {"scan", "--record-size", "0"},
              {"scan", "--total", "256", "--records", "1"},
@@ -267,6 +326,8 @@ TEST(CommandLineTest, UsageErrorsGoToStandardError) {
     }
     const std::pair<Arguments, const char*> texts[] = {
         {{"no-such-command"}, "`ostra` has no command 'no-such-command'"},
+        {{"eeprom", "--no-such-option", "no-such-command"},
+         "`ostra eeprom` has no command 'no-such-command'"},
         {{"readout", "one", "two"}, "one two"},
         {{"eeprom"}, "`ostra eeprom --help`"},
     };

@@ -42,6 +42,11 @@ TEST_P(ScanTest, FixedScansHaveTheirSize) {
         ExpectRecordsInOrder(bytes);
     }
     EXPECT_EQ(ScanRaw({"--total", "5120"}).size(), 5120u);
+    if (GetParam() == Transport::UsbIo) {
+        EXPECT_EQ(ScanRaw({"--total", "1000"}).size(), 1000u);
+    } else {
+        Fail({"scan", "--total", "1000"}, ExitCode::Usage, "1000 is none of 256");
+    }
 }
 
 TEST_P(ScanTest, OpenEndedScansEndWithTheInstrument) {
@@ -100,7 +105,7 @@ TEST_P(ScanTest, AFailedScanLeavesTheFileThatWasThere) {
     for (const char* faults : {"bulk-in 5:stall", ""}) {
         host.Add("sim", Streaming(25'600));
         SetFaults(faults);
-        Fail({"scan", "--total", "1000000", "--output", folder.Path("csv")}, ExitCode::InputOutput);
+        Fail({"scan", "--total", "1024000", "--output", folder.Path("csv")}, ExitCode::InputOutput);
         EXPECT_EQ(ReadFile(folder.Path("csv")), std::vector<std::uint8_t>{1});
         EXPECT_EQ(folder.Files().size(), 1u);
     }
@@ -112,7 +117,7 @@ TEST_P(ScanTest, AnInstrumentThatFallsSilentIsATimeout) {
     SetFaults("bulk-in 1+:silent");
     for (const std::vector<std::string>& kind :
          {std::vector<std::string>{"scan", "--timeout", "2"},
-          std::vector<std::string>{"scan", "--timeout", "2", "--total", "1000000"}}) {
+          std::vector<std::string>{"scan", "--timeout", "2", "--total", "1024000"}}) {
         const Stopwatch watch(clock);
         EXPECT_EQ(tool.Run(kind), ExitCode::Timeout) << tool.Err();
         watch.ExpectAtMost(20'000);
@@ -129,7 +134,7 @@ TEST_P(ScanTest, CtrlCEndsAScanAndLeavesTheInstrumentUsable) {
     auto& instrument = host.Add("sim", Streaming(100'000'000, 100'000));
     WriteFile(folder.Path("csv"), {1});
     for (const std::vector<std::string>& kind :
-         {std::vector<std::string>{"scan"}, std::vector<std::string>{"scan", "--total", "90000000"}}) {
+         {std::vector<std::string>{"scan"}, std::vector<std::string>{"scan", "--total", "89600000"}}) {
         Cli::Interruption interruption;
         tool.interruption = &interruption;
         const auto resets = instrument.WithCommands([](const auto& commands) { return commands.resets; });

@@ -28,6 +28,8 @@ class ToolRunner {
         Cli::Interruption none;
         return Cli::RunTool(arguments, surroundings, interruption != nullptr ? *interruption : none);
     }
+    /// From now on nothing can be written to standard output.
+    void CloseOut() { out.setstate(std::ios::badbit); }
     std::string Out() const { return out.str(); }
     std::string Err() const { return err.str(); }
     nlohmann::json Json() const { return nlohmann::json::parse(out.str()); }
