@@ -6,6 +6,10 @@
 /// What the tool asks of the system for itself; one source for each platform.
 namespace Varnholt::Cli {
 
+/// To be called before anything is opened: what is printed never goes into a file that took a closed stream's
+/// place.
+void SecureStandardStreams();
+
 /// What an output stream is connected to.
 struct StreamFacts {
     bool isTerminal = false;
@@ -18,6 +22,9 @@ StreamFacts FactsOfStandardError();
 
 /// Standard output carries bytes from now on, without translation of line ends.
 void SetStandardOutputBinary();
+
+/// A file's name as a command line takes it, whatever it begins with and holds.
+std::string QuotedFileName(const std::string& name);
 
 /// Returns when the file's content has reached the disk, as far as the system can tell. False on failure.
 bool SyncToDisk(const std::string& path);

@@ -6,11 +6,13 @@
 
 #include <algorithm>
 #include <atomic>
+#include <cctype>
 #include <cstdlib>
 #include <string_view>
 #include <thread>
 
 #include "ExitCode.h"
+#include "Platform/Posix/StandardStreams.h"
 #include "Terminal.h"
 
 namespace Varnholt::Cli {
@@ -47,16 +49,26 @@ StreamFacts FactsOf(int descriptor) {
     return facts;
 }
 
+/// Of the signals that ask to end, those that whoever started the program (nohup, a shell's background) does
+/// not want ignored. SIGTERM also ends the watching.
 sigset_t WatchedSignals() {
     sigset_t signals;
     sigemptyset(&signals);
-    for (const int number : {SIGINT, SIGTERM, SIGHUP}) {
-        sigaddset(&signals, number);
+    sigaddset(&signals, SIGTERM);
+    for (const int number : {SIGINT, SIGHUP}) {
+        struct sigaction action {};
+        if (::sigaction(number, nullptr, &action) == 0 && action.sa_handler != SIG_IGN) {
+            sigaddset(&signals, number);
+        }
     }
     return signals;
 }
 
 }  // namespace
+
+void SecureStandardStreams() {
+    Platform::SecureStandardStreams();
+}
 
 StreamFacts FactsOfStandardOutput() {
     return FactsOf(STDOUT_FILENO);
@@ -67,6 +79,22 @@ StreamFacts FactsOfStandardError() {
 }
 
 void SetStandardOutputBinary() {}
+
+std::string QuotedFileName(const std::string& name) {
+    const std::string file = (name.starts_with('-') ? "./" : "") + name;
+    const auto isPlain = [](unsigned char c) {
+        return std::isalnum(c) != 0 ||
+               std::string_view("_-./:=@%+,").find(static_cast<char>(c)) != std::string_view::npos;
+    };
+    if (!file.empty() && std::ranges::all_of(file, isPlain)) {
+        return file;
+    }
+    std::string quoted = "'";
+    for (const char c : file) {
+        quoted += c == '\'' ? std::string("'\\''") : std::string(1, c);
+    }
+    return quoted + "'";
+}
 
 bool SyncToDisk(const std::string& path) {
     const int file = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);

@@ -32,6 +32,8 @@ StreamFacts FactsOf(DWORD which) {
 
 }  // namespace
 
+void SecureStandardStreams() {}  // the run-time library opens none in their place
+
 StreamFacts FactsOfStandardOutput() {
     return FactsOf(STD_OUTPUT_HANDLE);
 }
@@ -42,6 +44,12 @@ StreamFacts FactsOfStandardError() {
 
 void SetStandardOutputBinary() {
     ::_setmode(::_fileno(stdout), _O_BINARY);
+}
+
+std::string QuotedFileName(const std::string& name) {
+    const std::string file = (name.starts_with('-') ? ".\\" : "") + name;
+    const bool isPlain = !file.empty() && file.find_first_of(" \t&|<>()^%!,;='`") == std::string::npos;
+    return isPlain ? file : '"' + file + '"';
 }
 
 bool SyncToDisk(const std::string& path) {

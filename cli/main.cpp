@@ -6,6 +6,7 @@
 using namespace Varnholt::Cli;
 
 int main(int argc, char** argv) {
+    SecureStandardStreams();
     try {
         Interruption interruption;
         const SignalWatch watch([&interruption] { interruption.Request(); });

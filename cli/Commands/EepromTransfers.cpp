@@ -8,6 +8,7 @@
 #include "Memory/MemoryTarget.h"
 #include "Output/AtomicFile.h"
 #include "Output/Json.h"
+#include "Terminal.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -23,8 +24,8 @@ void Backup(Session& session, const BackupOptions& options) {
     WriteFileAtomically(options.file, image);
     const bool isSane = IsSane(CheckImage(image));
     if (!isSane) {
-        session.Warn("the EEPROM holds what the driver cannot use; `ostra eeprom check " + options.file +
-                     "` says what");
+        session.Warn("the EEPROM holds what the driver cannot use; `ostra eeprom check " +
+                     QuotedFileName(options.file) + "` says what");
     }
     if (options.memory.json) {
         session.Print({{"identifier", instrument.Identifier()},
@@ -56,9 +57,9 @@ void CheckBeforeWriting(Session& session, const WriteOptions& options, const Eep
         return;
     }
     if (!options.force) {
-        throw ToolFailure(
-            ExitCode::BadData, options.file + " is not written: " + errors,
-            "`ostra eeprom check " + options.file + "` tells all; --force writes it all the same");
+        throw ToolFailure(ExitCode::BadData, options.file + " is not written: " + errors,
+                          "`ostra eeprom check " + QuotedFileName(options.file) +
+                              "` tells all; --force writes it all the same");
     }
     session.Warn(options.file + ": " + errors);
 }

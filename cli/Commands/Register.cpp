@@ -2,7 +2,6 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
@@ -25,13 +24,21 @@ struct Options {
     bool json = false;
 };
 
-std::vector<UsbId> RegisteredIn(const std::string& file) {
+std::string RulesIn(const std::string& file) {
+    std::error_code error;
+    const auto status = std::filesystem::status(file, error);
+    if (status.type() == std::filesystem::file_type::not_found) {
+        return {};
+    }
     std::ifstream stream(file);
-    return IdsInRules({std::istreambuf_iterator<char>(stream), {}});
+    if (!std::filesystem::is_regular_file(status) || !stream) {
+        throw ToolFailure(ExitCode::File, file + " cannot be read", "give a file of udev rules with --file");
+    }
+    return {std::istreambuf_iterator<char>(stream), {}};
 }
 
-void ChangeRules(const Options& options, const std::vector<UsbId>& ids) {
-    if (ids.empty()) {
+void ChangeRules(const Options& options, const std::string& rules) {
+    if (rules.empty()) {
         std::error_code error;
         std::filesystem::remove(options.file, error);
         if (error) {
@@ -41,9 +48,8 @@ void ChangeRules(const Options& options, const std::vector<UsbId>& ids) {
         }
         return;
     }
-    const std::string text = UdevRules(ids);
     AtomicFile file(options.file);
-    file.Stream() << text;
+    file.Stream() << rules;
     file.Commit();
 }
 
@@ -60,24 +66,20 @@ void ApplyRules(Session& session) {
 
 void Register(Session& session, const Options& options) {
     const UsbId id = ParseUsbId(options.id);
-    const std::vector<UsbId> before = RegisteredIn(options.file);
-    std::vector<UsbId> after = before;
-    std::erase(after, id);
-    if (!options.remove) {
-        after.push_back(id);
-    } else if (after == before) {
+    const std::string before = RulesIn(options.file);
+    const RulesLeft left = WithoutRule(before, id);
+    const std::string after = options.remove ? left.rules : WithRule(before, id);
+    if (options.remove && !left.changed) {
         throw ToolFailure(ExitCode::NoInstrument,
                           fmt::format("{} is not registered in {}", options.id, options.file));
     }
     if (options.dryRun) {
         if (options.json) {
-            session.Print({{"file", options.file},
-                           {"changed", false},
-                           {"content", after.empty() ? "" : UdevRules(after)}});
+            session.Print({{"file", options.file}, {"changed", false}, {"content", after}});
         } else if (after.empty()) {
             session.Out() << "would remove " << options.file << "\n";
         } else {
-            session.Out() << "would write " << options.file << ":\n" << UdevRules(after);
+            session.Out() << "would write " << options.file << ":\n" << after;
         }
         return;
     }
@@ -93,11 +95,14 @@ void Register(Session& session, const Options& options) {
         ApplyRules(session);
     }
     if (options.json) {
-        session.Print(
-            {{"file", options.file}, {"changed", true}, {"content", after.empty() ? "" : UdevRules(after)}});
+        session.Print({{"file", options.file}, {"changed", true}, {"content", after}});
     } else {
         session.Note(fmt::format("{} is {} ({})", options.id,
-                                 options.remove ? "no longer registered" : "registered", options.file));
+                                 options.remove
+                                     ? "no longer registered; access to what is plugged in ends with "
+                                       "its next unplugging"
+                                     : "registered",
+                                 options.file));
     }
 }
 
@@ -111,7 +116,7 @@ void AddRegister(CommandSpec app, Session& session) {
         .Required();
     command.AddFlag("--remove", options->remove, "take the registration back");
     command.AddFlag("--dry-run", options->dryRun, "show what would be written");
-    command.Add("--file", options->file, "the rule file");
+    command.Add("--file", options->file, "the file of udev rules; other rules in it stay");
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, Register);
 }

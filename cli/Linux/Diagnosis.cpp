@@ -54,9 +54,10 @@ void JudgeDevice(const DeviceFacts& facts, const Trial& trial, std::vector<Findi
     if (!facts.isAccessible) {
         findings.push_back(
             {Level::Problem, subject, "no permission on " + device.deviceNode,
-             fmt::format("log in at this machine's own seat, or run as root; `sudo ostra register {}` writes "
-                         "the rule anew, then {}",
-                         id, Replug),
+             fmt::format(
+                 "log in at this machine's own seat, or run as root; `sudo ostra register {}` applies "
+                 "the rule anew, then {}",
+                 id, Replug),
              ExitCode::NotAvailable});
         return;
     }
@@ -86,7 +87,8 @@ Finding JudgeSimulator(const Platform::Usb::SimulatorInfo& simulator, const Tria
                 "start an ostra-simulator of your own"};
     }
     if (simulator.usedBy == Platform::Usb::KernelAsUser) {
-        return {Level::Note, simulator.name, "is plugged into the kernel, which shows it as a USB device", ""};
+        return {Level::Note, simulator.name, "is plugged into the kernel, which shows it as a USB device",
+                ""};
     }
     if (!simulator.usedBy.empty()) {
         return {Level::Problem, simulator.name, "is in use by " + simulator.usedBy, EndTheOther,

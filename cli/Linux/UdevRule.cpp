@@ -5,11 +5,38 @@
 #include <algorithm>
 #include <cctype>
 #include <regex>
+#include <sstream>
 
 #include "Failure.h"
 #include "Platform/Usb/UdevBus.h"
 
 namespace Varnholt::Cli {
+namespace {
+
+const std::string Header =
+    "# Written by `ostra register`: these USB devices are measuring instruments.\n"
+    "# The library looks for the property; the tag gives the user at the seat access.\n";
+
+std::string Match(const UsbId& id) {
+    return fmt::format("ATTR{{idVendor}}==\"{}\", ATTR{{idProduct}}==\"{}\"", id.vendor, id.product);
+}
+
+std::string Mark() {
+    return fmt::format("ENV{{{}}}=\"1\"", Platform::Usb::InterfaceClassProperty);
+}
+
+std::string RuleFor(const UsbId& id) {
+    return fmt::format("SUBSYSTEM==\"usb\", ENV{{DEVTYPE}}==\"usb_device\", {}, {}, TAG+=\"uaccess\"\n",
+                       Match(id), Mark());
+}
+
+/// Whatever else somebody has added to it by hand.
+bool IsRuleFor(const UsbId& id, const std::string& line) {
+    return line.find_first_not_of(" \t") != line.find('#') && line.find(Match(id)) != std::string::npos &&
+           line.find(Mark()) != std::string::npos;
+}
+
+}  // namespace
 
 UsbId ParseUsbId(const std::string& text) {
     static const std::regex form("([0-9A-Fa-f]{4}):([0-9A-Fa-f]{4})");
@@ -27,28 +54,28 @@ UsbId ParseUsbId(const std::string& text) {
     return {lower(match[1]), lower(match[2])};
 }
 
-std::string UdevRules(const std::vector<UsbId>& ids) {
-    std::string text =
-        "# Written by `ostra register`: these USB devices are measuring instruments.\n"
-        "# The library looks for the property; the tag gives the user at the seat access.\n";
-    for (const UsbId& id : ids) {
-        text += fmt::format(
-            "SUBSYSTEM==\"usb\", ENV{{DEVTYPE}}==\"usb_device\", ATTR{{idVendor}}==\"{}\", "
-            "ATTR{{idProduct}}==\"{}\", "
-            "ENV{{{}}}=\"1\", TAG+=\"uaccess\"\n",
-            id.vendor, id.product, Platform::Usb::InterfaceClassProperty);
+std::string WithRule(const std::string& rules, const UsbId& id) {
+    if (!WithoutRule(rules, id).changed) {
+        const bool endsInLine = !rules.empty() && !rules.ends_with('\n');
+        return (rules.empty() ? Header : rules) + (endsInLine ? "\n" : "") + RuleFor(id);
     }
-    return text;
+    return rules;
 }
 
-std::vector<UsbId> IdsInRules(const std::string& rules) {
-    static const std::regex form(
-        R"re(ATTR\{idVendor\}=="([0-9a-f]{4})", ATTR\{idProduct\}=="([0-9a-f]{4})")re");
-    std::vector<UsbId> ids;
-    for (std::sregex_iterator rule(rules.begin(), rules.end(), form), end; rule != end; ++rule) {
-        ids.push_back({(*rule)[1], (*rule)[2]});
+RulesLeft WithoutRule(const std::string& rules, const UsbId& id) {
+    RulesLeft left;
+    std::istringstream lines(rules);
+    for (std::string line; std::getline(lines, line);) {
+        if (IsRuleFor(id, line)) {
+            left.changed = true;
+        } else {
+            left.rules += line + "\n";
+        }
     }
-    return ids;
+    if (left.rules == Header) {
+        left.rules.clear();
+    }
+    return left;
 }
 
 }  // namespace Varnholt::Cli

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <string>
-#include <vector>
 
 namespace Varnholt::Cli {
 
@@ -19,10 +18,14 @@ UsbId ParseUsbId(const std::string& text);
 /// Before 73-seat-late.rules, which gives the user at the seat access to what is tagged until then.
 inline constexpr const char* UdevRuleFile = "/etc/udev/rules.d/70-ostra.rules";
 
-/// The whole rule file for these devices: marks them as instruments and gives the user at the seat access.
-std::string UdevRules(const std::vector<UsbId>& ids);
+/// The content of a rule file with a rule that marks a device as an instrument and gives the user at the seat
+/// access. What else is in the file stays as it is.
+std::string WithRule(const std::string& rules, const UsbId& id);
 
-/// The devices that a rule file of that form names, in order.
-std::vector<UsbId> IdsInRules(const std::string& rules);
+struct RulesLeft {
+    std::string rules;     ///< empty when nothing is left
+    bool changed = false;  ///< false: there was no such rule
+};
+RulesLeft WithoutRule(const std::string& rules, const UsbId& id);
 
 }  // namespace Varnholt::Cli

@@ -10,6 +10,7 @@
 #include "Output/AtomicFile.h"
 #include "Output/Json.h"
 #include "Platform/Time.h"
+#include "Terminal.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -32,12 +33,6 @@ std::string NewBackupName(const std::string& identifier) {
             return candidate;
         }
     }
-}
-
-/// A file's name as the command line takes it.
-std::string Quoted(const std::string& fileName) {
-    const bool isPlain = fileName.find_first_of(" \t'\"\\$`&;|<>()*?!#~[]{}") == std::string::npos;
-    return isPlain ? fileName : fmt::format("\"{}\"", fileName);
 }
 
 std::string CountOf(std::size_t count, const char* what) {
@@ -90,7 +85,7 @@ MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, U
 }
 
 ToolFailure MemoryTarget::Unusable(const std::string& reason) const {
-    const std::string which = instrument ? "--device " + ShortNameOf(name) : Quoted(file);
+    const std::string which = instrument ? "--device " + ShortNameOf(name) : QuotedFileName(file);
     return {ExitCode::BadData, name + ": the driver cannot use what is in it: " + reason,
             "`ostra eeprom check " + which + "` tells what is wrong with it"};
 }
@@ -110,7 +105,8 @@ std::string MemoryTarget::WayBack(const std::string& backup) const {
         return "the same command once more writes what is missing; there is no backup";
     }
     return fmt::format("this brings back what was there before: ostra eeprom restore {} --device {}{}",
-                       Quoted(backup), ShortNameOf(name), IsSane(CheckImage(image)) ? "" : " --force");
+                       QuotedFileName(backup), ShortNameOf(name),
+                       IsSane(CheckImage(image)) ? "" : " --force");
 }
 
 MemoryTarget::Outcome MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& options,

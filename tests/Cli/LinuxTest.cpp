@@ -1,6 +1,10 @@
+#include <array>
+#include <cstdio>
+
 #include "Linux/Diagnosis.h"
 #include "Linux/UdevRule.h"
 #include "Platform/Usb/SimulatorAddress.h"
+#include "Terminal.h"
 #include "ToolFixture.h"
 
 namespace Varnholt::Tests {
@@ -154,6 +158,17 @@ TEST(DoctorTest, TellsOfWhatCannotBeUsed) {
     EXPECT_EQ(simulator.code, ExitCode::Success) << "somebody else's simulator is no failure";
 }
 
+TEST(FileNames, AreQuotedAsTheShellReadsThem) {
+    for (const char* name : {"image.bin", "-b", "two words", "a'b\"c", "$(false)`false`!*", "Ü"}) {
+        const std::string command = "printf %s " + Cli::QuotedFileName(name);
+        FILE* const shell = popen(command.c_str(), "r");
+        std::array<char, 64> read{};
+        EXPECT_NE(std::fgets(read.data(), read.size(), shell), nullptr);
+        pclose(shell);
+        EXPECT_EQ(read.data(), (*name == '-' ? "./" : "") + std::string(name));
+    }
+}
+
 class RegisterTest : public testing::Test {
   protected:
     ExitCode Register(std::vector<std::string> arguments) {
@@ -181,7 +196,22 @@ TEST_F(RegisterTest, WritesARuleForEachKindOnce) {
                "\", ENV{OSTRA_INTERFACE_CLASS}=\"1\", TAG+=\"uaccess\"\n";
     };
     const std::string rules = Rules();
-    EXPECT_EQ(rules.substr(rules.find("SUBSYSTEM")), rule("04b4", "1003") + rule("1209", "00ab"));
+    EXPECT_EQ(rules.substr(rules.find("SUBSYSTEM")), rule("1209", "00ab") + rule("04b4", "1003"));
+}
+
+TEST_F(RegisterTest, LeavesOtherRulesAlone) {
+    ASSERT_EQ(Register({"1209:0001"}), ExitCode::Success);
+    std::string rules = Rules();
+    rules.insert(rules.size() - 1, ", MODE=\"0660\"");
+    const std::string others =
+        "# mine\nSUBSYSTEM==\"tty\", MODE=\"0666\"\n # " + rules.substr(rules.find("SUBSYSTEM"));
+    const auto both = rules + others;
+    WriteFile(file, {both.begin(), both.end()});
+    EXPECT_EQ(Register({"1209:0001"}), ExitCode::Success);
+    EXPECT_EQ(Rules(), both);
+    EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success);
+    EXPECT_EQ(Rules(), rules.substr(0, rules.find("SUBSYSTEM")) + others);
+    EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::NoInstrument) << "a comment is no rule";
 }
 
 TEST_F(RegisterTest, TakesARegistrationBack) {
@@ -189,7 +219,8 @@ TEST_F(RegisterTest, TakesARegistrationBack) {
     ASSERT_EQ(Register({"04b4:1003"}), ExitCode::Success);
     EXPECT_EQ(Register({"1209:0002", "--remove"}), ExitCode::NoInstrument);
     EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success);
-    EXPECT_EQ(Rules(), Cli::UdevRules({{"04b4", "1003"}}));
+    EXPECT_EQ(Rules().find("\"1209\""), std::string::npos) << Rules();
+    EXPECT_NE(Rules().find("\"04b4\""), std::string::npos) << Rules();
     EXPECT_EQ(Register({"04b4:1003", "--remove"}), ExitCode::Success);
     EXPECT_FALSE(std::filesystem::exists(file)) << "a rule file without rules is of no use";
 }
