@@ -80,6 +80,15 @@ void JudgeDevice(const DeviceFacts& facts, const Trial& trial, std::vector<Findi
 }
 
 Finding JudgeSimulator(const Platform::Usb::SimulatorInfo& simulator, const Trial& trial) {
+    if (!simulator.answers) {
+        return {simulator.usable ? Level::Problem : Level::Note, simulator.name,
+                "does not answer; it may have been stopped",
+                simulator.processId == 0 ? "whoever runs it should let it go on, or end it"
+                                         : fmt::format("let it go on (kill -CONT {0}), or end it (kill -KILL "
+                                                       "{0})",
+                                                       simulator.processId),
+                ExitCode::Timeout};
+    }
     if (!simulator.usable) {
         return {Level::Note, simulator.name,
                 fmt::format("is run by another user (user {}, process {}) and cannot be used",

@@ -64,6 +64,8 @@ std::vector<Diagnosis> Diagnoses() {
     simulatorInKernel.usedBy = Platform::Usb::KernelAsUser;
     auto simulatorOfAnother = simulator;
     simulatorOfAnother.usable = false;
+    auto simulatorStopped = simulator;
+    simulatorStopped.answers = false;
     const std::vector problem{Level::Problem};
     const std::vector good{Level::Good};
     return {
@@ -106,6 +108,12 @@ std::vector<Diagnosis> Diagnoses() {
          "is in use by ostra (process 8)",
          "end that program",
          ExitCode::NotAvailable},
+        {"simulated, stopped",
+         {{}, {simulatorStopped}},
+         problem,
+         "simulated-1 does not answer",
+         "kill -CONT 9",
+         ExitCode::Timeout},
         {"simulated, another user's",
          {{}, {simulatorOfAnother}},
          {Level::Note, Level::Problem},
