@@ -93,10 +93,10 @@ void New(Session& session, const BackupOptions& options) {
     }
 }
 
-void AddWriteOptions(CommandSpec command, const std::shared_ptr<WriteOptions>& options) {
+void AddWriteOptions(CommandSpec command, const std::shared_ptr<WriteOptions>& options, BackupHabit habit) {
     command.Add("FILE", options->file, "image of 8192 bytes").Required();
     command.AddFlag("--force", options->force, "write an image that the driver cannot use").Group("Change");
-    AddChangeOptions(command, options->change);
+    AddChangeOptions(command, options->change, habit);
     AddInstrumentOptions(command, options->memory.instrument);
     AddJsonFlag(command, options->memory.json);
 }
@@ -114,12 +114,12 @@ void AddEepromTransfers(CommandSpec group, Session& session) {
     const auto write = std::make_shared<WriteOptions>();
     command = group.AddCommand(
         "write", "write an image the safe way: check it, make a backup, write what differs, read it back");
-    AddWriteOptions(command, write);
+    AddWriteOptions(command, write, BackupHabit::Always);
     SetAction(command, session, write, Write);
 
     const auto restore = std::make_shared<WriteOptions>();
     command = group.AddCommand("restore", "write a backup back (as `write`, without a new backup)");
-    AddWriteOptions(command, restore);
+    AddWriteOptions(command, restore, BackupHabit::WhenNamed);
     SetAction(command, session, restore, Restore);
 
     const auto fresh = std::make_shared<BackupOptions>();

@@ -59,15 +59,19 @@ void AddMemoryOptions(CommandSpec command, MemoryOptions& options) {
     AddJsonFlag(command, options.json);
 }
 
-void AddChangeOptions(CommandSpec command, ChangeOptions& options) {
+void AddChangeOptions(CommandSpec command, ChangeOptions& options, BackupHabit habit) {
+    const bool isMade = habit == BackupHabit::Always;
     const char* const group = "Change";
     command.AddFlag("--dry-run", options.dryRun, "show what would be done and do nothing").Group(group);
     command
         .Add("--backup", options.backupFile,
-             "file for the instrument's earlier content; must not exist (default: a new name)")
+             isMade ? "file for the instrument's earlier content; must not exist (default: a new name)"
+                    : "file for the instrument's earlier content; must not exist (default: no backup)")
         .Type("FILE")
         .Group(group);
-    command.AddFlag("--no-backup", options.noBackup, "make no backup").Excludes("--backup").Group(group);
+    if (isMade) {
+        command.AddFlag("--no-backup", options.noBackup, "make no backup").Excludes("--backup").Group(group);
+    }
 }
 
 MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, Use use)

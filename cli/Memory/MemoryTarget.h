@@ -26,8 +26,12 @@ struct ChangeOptions {
 
 /// --image FILE beside --device, --transport and --json.
 void AddMemoryOptions(CommandSpec command, MemoryOptions& options);
-/// --dry-run, --backup and --no-backup.
-void AddChangeOptions(CommandSpec command, ChangeOptions& options);
+enum class BackupHabit {
+    Always,     ///< unless --no-backup says otherwise
+    WhenNamed,  ///< with --backup only
+};
+/// --dry-run, --backup and, where it means something, --no-backup.
+void AddChangeOptions(CommandSpec command, ChangeOptions& options, BackupHabit habit = BackupHabit::Always);
 
 /// The content of an EEPROM, where it came from, and the way back to there.
 class MemoryTarget final {

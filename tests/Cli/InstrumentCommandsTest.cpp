@@ -313,6 +313,7 @@ TEST(CommandLineTest, UsageErrorsGoToStandardError) {
              {"monitor", "--for", "0"},
              {"scan", "--records", "0"},
              {"scan", "--total", "0"},
+             {"eeprom", "restore", "image", "--no-backup"},
              {"scan", "--record-size", "6554"},
              {"scan", "--record-size", "0"},
              {"scan", "--total", "256", "--records", "1"},
