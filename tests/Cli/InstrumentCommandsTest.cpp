@@ -103,15 +103,19 @@ TEST_P(InstrumentCommandsTest, ReadoutRepeatsFromStartToStart) {
         const char* repeat;
         const char* interval;
     };
-    // The second is longer than 32 bits count milliseconds.
-    for (const Case& row : {Case{"3", "2"}, Case{"52", "86400"}}) {
+    std::vector<Case> cases{{"3", "2"}};
+    if (clock.IsVirtual()) {
+        cases.push_back({"52", "86400"});  // longer than 32 bits count milliseconds
+    }
+    for (const Case& row : cases) {
         Succeed({"readout", "--json", "--repeat", row.repeat, "--interval", row.interval});
         const auto lines = tool.Lines();
         ASSERT_EQ(lines.size(), std::stoul(row.repeat));
         for (std::size_t i = 0; i < lines.size(); ++i) {
             const auto line = nlohmann::json::parse(lines[i]);
             EXPECT_EQ(line["readout"], i + 1);
-            EXPECT_NEAR(line["seconds"], std::stod(row.interval) * static_cast<double>(i), 0.01);
+            EXPECT_NEAR(line["seconds"], std::stod(row.interval) * static_cast<double>(i),
+                        clock.IsVirtual() ? 0.01 : 0.5);
         }
     }
 }
