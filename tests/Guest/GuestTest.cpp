@@ -347,32 +347,40 @@ TEST_P(OnKernel, IsMeasuredAgainstLibusbAlone) {
     std::printf("readout: %.1f ms more than libusb alone\n", (readouts.ours - readouts.bare) * 1e3);
 }
 
-/// Unplugs at every so many transfers of a readout, an image write and a scan: each time a documented
-/// outcome, and the instrument works when it is back.
+/// Unplugs at every so many transfers of a readout, an image write and a scan: each time the host is told, in
+/// time, and the instrument works when it is back.
 TEST_P(OnKernel, UnplugsAtTransferAfterTransfer) {
     struct Job {
         const char* name;
         int transfers;
         std::vector<std::string> arguments;
-        std::function<void()> run;
+        std::function<bool()> succeeds;
     };
-    const auto expected = [](const std::function<void()>& work) {
+    const auto withoutException = [](const std::function<void()>& work) {
         return [work] {
             try {
                 work();
-            } catch (const DeviceDriverException&) {
+                return true;
+            } catch (const DeviceDriverException& exception) {
+                EXPECT_STRNE(exception.what(), "");
+                return false;
             }
         };
     };
+    const auto writesImage = [] {
+        const int result = f3355d91d5df0e0b(CountingImage().data(), "");
+        EXPECT_TRUE(result == OSTRA_OK || result == OSTRA_UNKNOWN_FAILURE) << result;
+        return result == OSTRA_OK;
+    };
     const std::vector<Job> jobs{
-        {"readout", 4, {}, expected([] {
+        {"readout", 4, {}, withoutException([] {
              PellandoFunctionality instrument(nullptr, 0);
              std::array<std::uint8_t, 256> buffer{};
              instrument.SetMeasureParameters(294, 0, 1, 6);
              instrument.MeasureRequest(buffer.data(), 256, 1);
          })},
-        {"image write", 128, {}, [] { f3355d91d5df0e0b(CountingImage().data(), ""); }},
-        {"scan", 6, {"--scan-bytes", "300000"}, expected([] {
+        {"image write", 128, {}, writesImage},
+        {"scan", 6, {"--scan-bytes", "300000"}, withoutException([] {
              PellandoFunctionality instrument(nullptr, 0);
              Scan(instrument, 1000, 300000);
          })},
@@ -384,11 +392,15 @@ TEST_P(OnKernel, UnplugsAtTransferAfterTransfer) {
     ASSERT_GE(first, 0);
     ASSERT_GT(count, 0);
     constexpr std::array kinds{"gone-before", "gone-during", "gone-after"};
+    constexpr std::size_t goneAfter = 2;
     for (int round = first; round < first + count; ++round) {
         const Job& job = jobs[static_cast<std::size_t>(round) % jobs.size()];
         const int turn = round / static_cast<int>(jobs.size());
         const int transfer = turn * 7 % job.transfers;
-        const auto kind = static_cast<std::size_t>(turn + turn / job.transfers) % kinds.size();
+        auto kind = static_cast<std::size_t>(turn + turn / job.transfers) % kinds.size();
+        if (GetParam() && transfer == 0 && kind == goneAfter) {
+            kind = 0;  // the library's first transfer waits for the button, and nobody presses it
+        }
         const std::string plan = std::to_string(transfer) + ":" + kinds[kind];
         SCOPED_TRACE(std::string(job.name) + " " + plan);
         std::vector<std::string> arguments = job.arguments;
@@ -396,8 +408,11 @@ TEST_P(OnKernel, UnplugsAtTransferAfterTransfer) {
         {
             const PluggedInstrument plugged(arguments);
             const auto start = steady_clock::now();
-            job.run();
+            const bool succeeded = job.succeeds();
             EXPECT_LT(steady_clock::now() - start, std::chrono::seconds(20));
+            // Behind its last transfer a job has succeeded.
+            EXPECT_TRUE(!succeeded || kind == goneAfter);
+            EXPECT_TRUE(WaitFor([] { return !AnyPluggedIn(); })) << "it was not pulled out";
         }
         if (HasFailure()) {
             return;
