@@ -9,11 +9,9 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
 #include <cstring>
 #include <fstream>
-#include <optional>
 #include <stdexcept>
 #include <utility>
 
@@ -139,157 +137,6 @@ class UsbIpServer::Exports final : public UsbIpExports {
     const std::string peerText;
     const bool tcp;
     Exported* imported = nullptr;
-};
-
-/// A connected socket with its session. Never waits for its peer.
-class UsbIpServer::Connection final {
-  public:
-    Connection(UsbIpServer& ownServer, int connectedSocket, std::vector<Exported*> offered, bool tcp,
-               const std::string& peer)
-        : server(ownServer),
-          file(connectedSocket),
-          peerText(peer),
-          exports(std::in_place, ownServer, std::move(offered), peer, tcp) {}
-    ~Connection() {
-        Abandon();
-        session.reset();
-        exports.reset();
-        // The peer takes this for the sign that the instrument is free again.
-        close(file);
-    }
-    Connection(const Connection&) = delete;
-    Connection& operator=(const Connection&) = delete;
-
-    /// Waits for what the peer wants.
-    void Begin() {
-        session = std::make_unique<UsbIpSession>(*exports, [this] { FlushSoon(); });
-        Watch();
-    }
-    /// Begins with an instrument that the peer need not ask for; false when somebody else has it.
-    bool BeginWith(Exported& wanted) {
-        UsbIpExports::Import import = exports->Take(wanted);
-        if (!import.device) {
-            return false;
-        }
-        session = std::make_unique<UsbIpSession>(std::move(import.device), [this] { FlushSoon(); });
-        Watch();
-        return true;
-    }
-    /// No more is heard of it; it may be one of its own functions that is running.
-    void Abandon() {
-        abandoned = true;
-        server.loop.Forget(flush);
-        server.loop.Forget(deadline);
-        server.loop.Unwatch(file);
-    }
-
-  private:
-    void Watch() {
-        short events = 0;
-        if (session->WantsInput()) {
-            events = static_cast<short>(events | POLLIN);
-        }
-        if (!session->Output().empty()) {
-            events = static_cast<short>(events | POLLOUT);
-        }
-        if (events != watchedFor) {
-            watchedFor = events;
-            server.loop.Watch(file, events, [this] { Ready(); });
-        }
-        if (deadline == 0 && session->PeerIsDue()) {
-            CheckPeerAt(server.loop.Now() + Patience);
-        }
-    }
-
-    void CheckPeerAt(std::uint64_t time) {
-        deadline = server.loop.CallAt(time, [this] {
-            deadline = 0;
-            if (!session->PeerIsDue()) {
-                return;
-            }
-            if (lastMoved + Patience > server.loop.Now()) {
-                CheckPeerAt(lastMoved + Patience);
-                return;
-            }
-            server.Tell(peerText + ": silent for too long");
-            server.Remove(*this);
-        });
-    }
-
-    /// Not from inside the session, which is busy.
-    void FlushSoon() {
-        if (flush == 0 && !abandoned) {
-            flush = server.loop.CallSoon([this] {
-                flush = 0;
-                Flush();
-            });
-        }
-    }
-
-    void Ready() {
-        if (session->WantsInput() && inputStart == inputEnd) {
-            const ssize_t count = recv(file, input.data(), input.size(), MSG_DONTWAIT);
-            if (count == 0 || (count < 0 && errno != EAGAIN && errno != EINTR)) {
-                server.Remove(*this);
-                return;
-            }
-            lastMoved = server.loop.Now();
-            inputStart = 0;
-            inputEnd = static_cast<std::size_t>(std::max<ssize_t>(count, 0));
-        }
-        Flush();
-    }
-
-    /// Lets the session have what was received, and the peer what the session has for it, as far as it goes.
-    void Flush() {
-        do {
-            inputStart += session->Receive(std::span(input).subspan(inputStart, inputEnd - inputStart));
-            if (!SendOutput()) {
-                server.Remove(*this);
-                return;
-            }
-        } while (session->WantsInput() && inputStart < inputEnd);
-        if (session->Over() && session->Output().empty()) {
-            if (!session->Complaint().empty()) {
-                server.Tell(peerText + ": " + session->Complaint());
-            }
-            server.Remove(*this);
-            return;
-        }
-        Watch();
-    }
-
-    /// False when the peer is lost.
-    bool SendOutput() {
-        while (!session->Output().empty()) {
-            const auto output = session->Output();
-            const ssize_t count = send(file, output.data(), output.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
-            if (count < 0 && errno != EINTR) {
-                return errno == EAGAIN;
-            }
-            lastMoved = server.loop.Now();
-            session->OutputSent(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
-        }
-        return true;
-    }
-
-    /// A peer that is due and moves no byte for so long is given up: it would keep its connection for ever.
-    static constexpr std::uint64_t Patience = 5'000'000;
-
-    UsbIpServer& server;
-    const int file;
-    const std::string peerText;
-    std::optional<Exports> exports;
-    std::unique_ptr<UsbIpSession> session;
-    // Received and not taken yet. Its size bounds how long one peer keeps the others waiting.
-    std::array<std::uint8_t, 65536> input{};
-    std::size_t inputStart = 0;
-    std::size_t inputEnd = 0;
-    Platform::EventScheduler::EventId flush = 0;
-    Platform::EventScheduler::EventId deadline = 0;
-    std::uint64_t lastMoved = 0;  // when bytes went either way
-    short watchedFor = -1;
-    bool abandoned = false;
 };
 
 UsbIpServer::UsbIpServer(PollLoop& pollLoop, Log logger) : loop(pollLoop), log(std::move(logger)) {}
@@ -419,28 +266,34 @@ void UsbIpServer::Accept(const Listener& listener) {
         close(file);
         return;
     }
-    connections.push_back(
-        std::make_unique<Connection>(*this, file, listener.offered, !listener.unixSocket, peer));
-    connections.back()->Begin();
+    Connect(file, std::make_unique<Exports>(*this, listener.offered, peer, !listener.unixSocket), peer)
+        .Begin();
 }
 
 void UsbIpServer::Serve(int connectedSocket, const std::string& name, const std::string& peer) {
-    fcntl(connectedSocket, F_SETFL, O_NONBLOCK);
-    auto connection =
-        std::make_unique<Connection>(*this, connectedSocket, std::vector<Exported*>(), false, peer);
-    if (!connection->BeginWith(Find(name))) {
+    auto exports = std::make_unique<Exports>(*this, std::vector<Exported*>(), peer, false);
+    const std::shared_ptr<UsbDevice> device = exports->Take(Find(name)).device;
+    if (!device) {
+        close(connectedSocket);
         throw std::runtime_error("\"" + name + "\" is in use");
     }
-    connections.push_back(std::move(connection));
+    fcntl(connectedSocket, F_SETFL, O_NONBLOCK);
+    Connect(connectedSocket, std::move(exports), peer).BeginWith(device);
 }
 
-void UsbIpServer::Remove(Connection& connection) {
+UsbIpConnection& UsbIpServer::Connect(int file, std::unique_ptr<Exports> exports, const std::string& peer) {
+    const auto over = [this, peer](UsbIpConnection& connection, const std::string& complaint) {
+        if (!complaint.empty()) {
+            Tell(peer + ": " + complaint);
+        }
+        Remove(connection);
+    };
+    return *connections.emplace_back(std::make_unique<UsbIpConnection>(loop, file, std::move(exports), over));
+}
+
+void UsbIpServer::Remove(UsbIpConnection& connection) {
     const auto found =
         std::ranges::find_if(connections, [&](const auto& each) { return each.get() == &connection; });
-    if (found == connections.end()) {
-        return;
-    }
-    connection.Abandon();
     removed.splice(removed.end(), connections, found);
     if (cleaning == 0) {
         cleaning = loop.CallSoon([this] {

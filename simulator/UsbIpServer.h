@@ -3,7 +3,6 @@
 #include <cstdint>
 #include <functional>
 #include <list>
-#include <map>
 #include <memory>
 #include <string>
 #include <vector>
@@ -12,6 +11,7 @@
 #include "PollLoop.h"
 #include "SimulatedInstrument.h"
 #include "TransferLog.h"
+#include "UsbIpConnection.h"
 #include "UsbIpSession.h"
 
 namespace Varnholt::Simulator {
@@ -50,7 +50,6 @@ class UsbIpServer final {
   private:
     struct Exported;
     class Exports;
-    class Connection;
 
     struct Listener {
         int file;
@@ -63,16 +62,18 @@ class UsbIpServer final {
     void Listen();
     void PauseListening();
     void Accept(const Listener& listener);
-    /// Ends a connection; it may be one of its own functions that asks.
-    void Remove(Connection& connection);
+    /// Adds a connection, which has yet to begin.
+    UsbIpConnection& Connect(int file, std::unique_ptr<Exports> exports, const std::string& peer);
+    /// Ends a connection as soon as what is being called has returned: it may be one of its own functions.
+    void Remove(UsbIpConnection& connection);
     void Tell(const std::string& line) const;
 
     PollLoop& loop;
     const Log log;
     std::list<Exported> exportedInstruments;
     std::list<Listener> listeners;
-    std::list<std::unique_ptr<Connection>> connections;
-    std::list<std::unique_ptr<Connection>> removed;
+    std::list<std::unique_ptr<UsbIpConnection>> connections;
+    std::list<std::unique_ptr<UsbIpConnection>> removed;
     Platform::EventScheduler::EventId cleaning = 0;
     Platform::EventScheduler::EventId relistening = 0;
 };

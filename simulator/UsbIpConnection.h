@@ -1,0 +1,60 @@
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "PollLoop.h"
+#include "UsbIpSession.h"
+
+namespace Varnholt::Simulator {
+
+/// A connected stream socket and the session on it. Never waits for its peer. Lives on the loop's thread.
+class UsbIpConnection final {
+  public:
+    /// The connection is over, for a reason that is empty when it ended as it should. Called once, by one of
+    /// the connection's own functions: it is to be destroyed later.
+    using Over = std::function<void(UsbIpConnection& connection, const std::string& complaint)>;
+
+    /// Owns the socket, which does not block, and what the peer can import. The loop must outlive it.
+    UsbIpConnection(PollLoop& pollLoop, int connectedSocket, std::unique_ptr<UsbIpExports> offered,
+                    Over whenOver);
+    ~UsbIpConnection();
+    UsbIpConnection(const UsbIpConnection&) = delete;
+    UsbIpConnection& operator=(const UsbIpConnection&) = delete;
+
+    /// Waits for what the peer wants.
+    void Begin();
+    /// Begins with a claimed device that the peer need not ask for.
+    void BeginWith(std::shared_ptr<Platform::Usb::UsbDevice> device);
+
+  private:
+    void Watch();
+    void CheckPeerAt(std::uint64_t time);
+    void FlushSoon();
+    void Ready();
+    void Flush();
+    bool SendOutput();
+    void StopListening();
+    void End(const std::string& complaint = {});
+
+    PollLoop& loop;
+    const int file;
+    std::unique_ptr<UsbIpExports> exports;
+    const Over over;
+    std::unique_ptr<UsbIpSession> session;
+    // Received and not taken yet. Its size bounds how long one peer keeps the others waiting.
+    std::array<std::uint8_t, 65536> input{};
+    std::size_t inputStart = 0;
+    std::size_t inputEnd = 0;
+    Platform::EventScheduler::EventId flush = 0;
+    Platform::EventScheduler::EventId deadline = 0;
+    std::uint64_t lastMoved = 0;  // when bytes went either way
+    short watchedFor = -1;
+    bool ended = false;
+};
+
+}  // namespace Varnholt::Simulator
