@@ -5,9 +5,11 @@
 #include <algorithm>
 #include <cerrno>
 #include <fstream>
+#include <map>
+#include <mutex>
 #include <optional>
-#include <set>
 #include <sstream>
+#include <utility>
 
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/UsbIpDevice.h"
@@ -15,14 +17,18 @@
 namespace Varnholt::Platform::Usb {
 namespace {
 
-/// The names at which somebody listens.
-std::set<std::string> ListeningNames() {
+/// The sockets at which somebody listens: their numbers, by name. A number is not used again for another
+/// socket.
+std::map<std::string, std::string> ListeningSockets() {
     constexpr unsigned long acceptsConnections = 0x10000;
     const std::string prefix = std::string("@") + SimulatorSocketPrefix;
-    std::set<std::string> names;
+    std::map<std::string, std::string> sockets;
     std::ifstream table("/proc/net/unix");
     std::string line;
     while (std::getline(table, line)) {
+        if (line.find(prefix) == std::string::npos) {
+            continue;  // a desktop has hundreds of others
+        }
         std::istringstream fields(line);
         std::string address;
         std::string references;
@@ -30,17 +36,22 @@ std::set<std::string> ListeningNames() {
         unsigned long flags = 0;
         std::string type;
         std::string state;
-        std::string inode;
+        std::string number;
         std::string path;
-        fields >> address >> references >> protocol >> std::hex >> flags >> type >> state >> inode >> path;
+        fields >> address >> references >> protocol >> std::hex >> flags >> type >> state >> number >> path;
         if (fields && (flags & acceptsConnections) != 0 && path.starts_with(prefix)) {
             const std::string name = path.substr(prefix.size());
             if (IsSimulatorName(name)) {
-                names.insert(name);
+                sockets[name] = number;
             }
         }
     }
-    return names;
+    return sockets;
+}
+
+/// Root's would refuse anybody else, and root trusts no other user's.
+bool IsUsable(std::uint32_t userId) {
+    return userId == geteuid();
 }
 
 /// A connection whose other end was looked at.
@@ -58,8 +69,7 @@ std::optional<Connection> Connect(const std::string& name) {
     }
     if (const auto peer = CredentialsOfPeer(connection.file)) {
         connection.peer = *peer;
-        // Root's would refuse anybody else, and root trusts no other user's.
-        connection.usable = peer->userId == geteuid();
+        connection.usable = IsUsable(peer->userId);
     }
     return connection;
 }
@@ -111,15 +121,25 @@ void AskForUser(const std::string& name, SimulatorInfo& info) {
     }
 }
 
+/// Opening an instrument asks some ten times what is there: who listens at a socket stays the same, and a
+/// simulator is troubled once only.
 class SimulatorsOfThisUser final : public UsbBus {
   public:
     std::vector<std::string> List() override {
+        const std::lock_guard lock(mutex);
+        std::map<std::string, std::uint32_t> users;
         std::vector<std::string> names;
-        for (const std::string& name : ListeningNames()) {
-            if (const auto info = Describe(name); info && info->usable) {
-                names.push_back(info->name);
+        for (const auto& [name, socket] : ListeningSockets()) {
+            if (const auto known = userBySocket.find(socket); known != userBySocket.end()) {
+                users.insert(*known);
+            } else if (const auto info = Describe(name)) {
+                users[socket] = info->userId;
+            }
+            if (const auto user = users.find(socket); user != users.end() && IsUsable(user->second)) {
+                names.push_back(SimulatedPrefix + name);
             }
         }
+        userBySocket = std::move(users);
         return names;
     }
 
@@ -138,13 +158,17 @@ class SimulatorsOfThisUser final : public UsbBus {
         error = Errors::Success;
         return MakeUsbIpDevice(ConnectorTo(name), SimulatorBusId);
     }
+
+  private:
+    std::mutex mutex;                                   // guards what follows
+    std::map<std::string, std::uint32_t> userBySocket;  // of those that listened the last time
 };
 
 }  // namespace
 
 std::vector<SimulatorInfo> ListSimulators() {
     std::vector<SimulatorInfo> simulators;
-    for (const std::string& name : ListeningNames()) {
+    for (const auto& [name, socket] : ListeningSockets()) {
         if (auto info = Describe(name)) {
             if (info->usable) {
                 AskForUser(name, *info);
