@@ -1,6 +1,5 @@
 #include "Platform/Drivers/DriverFileSystem.h"
 
-#include <algorithm>
 #include <array>
 #include <atomic>
 #include <map>
@@ -170,8 +169,7 @@ Handle DriverFileSystem::Open(const std::string& path) {
 }
 
 std::unique_ptr<DriverFile> DriverFileSystem::OpenOnDevice(const DevicePath& path, ErrorCode& error) {
-    const std::vector<std::string> present = bus.List();
-    if (std::find(present.begin(), present.end(), path.name) == present.end()) {
+    if (!bus.Has(path.name)) {
         error = Errors::FileNotFound;
         return nullptr;
     }

@@ -18,9 +18,15 @@ class AllInstruments final : public UsbBus {
         return names;
     }
 
+    bool Has(const std::string& name) override { return BusOf(name).Has(name); }
+
     std::shared_ptr<UsbDevice> Open(const std::string& name, ErrorCode& error) override {
-        return name.starts_with(SimulatedPrefix) ? SimulatorBus().Open(name, error)
-                                                 : RealUsbBus().Open(name, error);
+        return BusOf(name).Open(name, error);
+    }
+
+  private:
+    static UsbBus& BusOf(const std::string& name) {
+        return name.starts_with(SimulatedPrefix) ? SimulatorBus() : RealUsbBus();
     }
 };
 

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <memory>
@@ -102,6 +103,11 @@ class UsbBus {
     /// The names of the instruments that are present, in a stable order. A name says where the instrument is
     /// plugged in and survives replugging; it has no slash or backslash.
     virtual std::vector<std::string> List() = 0;
+    /// Whether it is one of them; where that is found out faster than all of them.
+    virtual bool Has(const std::string& name) {
+        const std::vector<std::string> names = List();
+        return std::find(names.begin(), names.end(), name) != names.end();
+    }
     /// Null on failure with the code in `error`. Opening does not claim the device.
     virtual std::shared_ptr<UsbDevice> Open(const std::string& name, ErrorCode& error) = 0;
 };
