@@ -18,6 +18,7 @@
 #include "FaultPlan.h"
 #include "FreshEeprom.h"
 #include "KernelPort.h"
+#include "Platform/Posix/StandardStreams.h"
 #include "Platform/Usb/PcapngWriter.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/SimulatorBus.h"
@@ -161,6 +162,7 @@ void Run(const ProgramOptions& options) {
 }  // namespace
 
 int main(int argc, char** argv) {
+    Varnholt::Platform::SecureStandardStreams();
     constexpr int usageError = 2;
     ProgramOptions options;
     CLI::App program("Simulates the instrument, so that everything runs without hardware.");

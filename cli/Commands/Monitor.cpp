@@ -1,12 +1,13 @@
 #include <fmt/format.h>
 
+#include <algorithm>
 #include <deque>
 #include <utility>
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
+#include "ElapsedTime.h"
 #include "Output/Json.h"
-#include "Platform/Time.h"
 #include "Platform/WaitableObjects.h"
 
 namespace Varnholt::Cli {
@@ -23,12 +24,16 @@ class Mailbox final : public DeviceDriver::Generic::EventListener {
   public:
     struct Message {
         std::uint32_t code;
-        std::uint32_t tick;
+        std::uint64_t milliseconds;  ///< on the mailbox's clock
     };
 
     void MessageFromDevice(std::uint32_t code, std::uint32_t) override {
         const Platform::CriticalSection::Holder holder(section);
-        waiting.push_back({code, Platform::TickCount()});
+        waiting.push_back({code, time.Milliseconds()});
+    }
+    std::uint64_t Now() {
+        const Platform::CriticalSection::Holder holder(section);
+        return time.Milliseconds();
     }
     std::deque<Message> Take() {
         const Platform::CriticalSection::Holder holder(section);
@@ -36,7 +41,8 @@ class Mailbox final : public DeviceDriver::Generic::EventListener {
     }
 
   private:
-    Platform::CriticalSection section;  ///< guards `waiting`
+    Platform::CriticalSection section;  ///< guards what follows
+    ElapsedTime time;
     std::deque<Message> waiting;
 };
 
@@ -47,13 +53,13 @@ void Monitor(Session& session, const Options& options) {
     Instrument instrument(session, options.instrument, Instrument::Choice::FirstWillDo, &mailbox);
     // There is nothing to cut off, and aborted pipes would look like an instrument that is gone.
     const Interruption::Deferral deferral(session.UserInterruption());
-    const std::uint32_t start = Platform::TickCount();
+    const std::uint64_t start = mailbox.Now();
     session.Note("watching " + instrument.Identifier() + "; Ctrl-C ends");
     for (bool isGone = false; !isGone;) {
         for (const Mailbox::Message& message : mailbox.Take()) {
             const bool isButton = message.code == DeviceDriver::Generic::MessageButtonData;
             isGone = isGone || message.code == DeviceDriver::Generic::MessageDeviceGone;
-            const double seconds = (message.tick - start) / 1000.0;
+            const double seconds = static_cast<double>(std::max(message.milliseconds, start) - start) / 1000;
             const char* const event = isButton ? "button" : isGone ? "removed" : "unknown";
             if (options.json) {
                 session.Print({{"seconds", seconds}, {"event", event}, {"code", message.code}});
@@ -62,8 +68,8 @@ void Monitor(Session& session, const Options& options) {
             }
             session.FlushOut();
         }
-        const std::uint32_t elapsed = Platform::TickCount() - start;
-        const bool isOver = options.seconds > 0 && elapsed >= options.seconds * 1000;
+        const auto elapsed = static_cast<double>(mailbox.Now() - start) / 1000;
+        const bool isOver = options.seconds > 0 && elapsed >= options.seconds;
         if (isOver || !session.UserInterruption().Sleep(LookInterval)) {
             break;
         }

@@ -10,10 +10,10 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
+#include "ElapsedTime.h"
 #include "Measurement.h"
 #include "Output/AtomicFile.h"
 #include "Output/Json.h"
-#include "Platform/Time.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -56,22 +56,6 @@ void PrintTable(std::ostream& out, const Values& values) {
         out << '\n';
     }
 }
-
-/// How long it is since it was made: longer than the platform's count of milliseconds goes, as long as it is
-/// asked before that has gone round.
-class ElapsedTime final {
-  public:
-    std::uint64_t Milliseconds() {
-        const std::uint32_t now = Platform::TickCount();
-        elapsed += now - last;
-        last = now;
-        return elapsed;
-    }
-
-  private:
-    std::uint32_t last = Platform::TickCount();
-    std::uint64_t elapsed = 0;
-};
 
 /// Writes readouts in the form that the user asked for.
 class Writer final {
