@@ -408,10 +408,10 @@ TEST_P(OnKernel, UnplugsAtTransferAfterTransfer) {
             const auto start = steady_clock::now();
             const bool succeeded = job.succeeds();
             EXPECT_LT(steady_clock::now() - start, std::chrono::seconds(20));
-            // Behind its last transfer a job has succeeded. And a transfer that waits for the button has no
-            // end to pull the plug at: such a round does not count.
-            EXPECT_TRUE(!succeeded || kind == goneAfter);
             pulledOut = WaitFor([] { return !AnyPluggedIn(); }, milliseconds(succeeded ? 1000 : 8000));
+            // Behind its last transfer a job has succeeded. A transfer that waits for the button may not come
+            // to the place where the plug is pulled, and nothing happens: such a round does not count.
+            EXPECT_TRUE(!succeeded || !pulledOut || kind == goneAfter);
             EXPECT_TRUE(pulledOut || succeeded) << "it failed and was not pulled out";
         }
         if (HasFailure()) {
