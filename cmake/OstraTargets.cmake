@@ -61,26 +61,39 @@ function(ostra_program NAME)
   target_link_libraries(${NAME} PRIVATE ${ARG_LINK} ostra_options)
 endfunction()
 
-# ostra_test(NAME SOURCES ... [LINK ...] [EXACT_TIME ...]): a GoogleTest program, run by ctest as one test under its name.
-# EXACT_TIME names cases (as in --gtest_filter) whose outcome hangs on milliseconds or which take minutes: they are left
-# out where there is no virtual time, on Windows.
+# ostra_test(NAME SOURCES ... [LINK ...] [EXACT_TIME ...] [WAITS_LONG]): a GoogleTest program, run by ctest as one test
+# under its name. Where there is no virtual time, on Windows, the cases are left out that EXACT_TIME names (as in
+# --gtest_filter), because their outcome hangs on milliseconds or they take minutes, and a program that WAITS_LONG runs
+# as several tests side by side, each with its share of the cases.
 function(ostra_test NAME)
-  cmake_parse_arguments(ARG "" "" "SOURCES;LINK;EXACT_TIME" ${ARGN})
+  cmake_parse_arguments(ARG "WAITS_LONG" "" "SOURCES;LINK;EXACT_TIME" ${ARGN})
   ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest)
   target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
   if(OSTRA_SANITIZE)
     target_compile_options(${NAME} PRIVATE -O0)  # what is tested is optimised; its tests had better compile fast
   endif()
-  add_test(NAME ${NAME} COMMAND ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:${NAME}>)
-  set_tests_properties(${NAME} PROPERTIES TIMEOUT 500 SKIP_RETURN_CODE 77)
+  set(COMMAND ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:${NAME}>)
   if(WIN32)
     # Each test has a Windows of its own, so none waits for another.
-    if(ARG_EXACT_TIME)
-      list(JOIN ARG_EXACT_TIME ":" LEFT_OUT)
-      set_tests_properties(${NAME} PROPERTIES ENVIRONMENT "GTEST_FILTER=-${LEFT_OUT}")
+    list(JOIN ARG_EXACT_TIME ":" LEFT_OUT)
+    set(SHARDS 1)
+    if(ARG_WAITS_LONG)
+      set(SHARDS 3)
     endif()
+    foreach(SHARD RANGE 1 ${SHARDS})
+      set(TEST ${NAME})
+      if(ARG_WAITS_LONG)
+        set(TEST ${NAME}_${SHARD}_of_${SHARDS})
+      endif()
+      math(EXPR INDEX "${SHARD} - 1")
+      add_test(NAME ${TEST} COMMAND ${COMMAND})
+      set_tests_properties(${TEST} PROPERTIES TIMEOUT 500 SKIP_RETURN_CODE 77
+        ENVIRONMENT "GTEST_FILTER=-${LEFT_OUT};GTEST_TOTAL_SHARDS=${SHARDS};GTEST_SHARD_INDEX=${INDEX}")
+    endforeach()
     return()
   endif()
+  add_test(NAME ${NAME} COMMAND ${COMMAND})
+  set_tests_properties(${NAME} PROPERTIES TIMEOUT 500 SKIP_RETURN_CODE 77)
   # The native transport locks an instrument for the whole machine, by its path: tests of it wait for each other.
   foreach(LIBRARY IN ITEMS ostra_native ostra_browser ostra_interface ostra_cli)
     if(LIBRARY IN_LIST ARG_LINK)
