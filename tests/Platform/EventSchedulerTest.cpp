@@ -86,7 +86,7 @@ TEST_P(Schedulers, LeaveNoThreadBehind) {
     EventScheduler& scheduler = ClockScheduler();
     const OwnedHandle done(MakeAutoResetEvent());
     TestThread([] {}).Join();  // a sanitizer starts a thread of its own with the first
-    const ResourceCount before = ResourceCount::Take();
+    const ResourceCount before = ResourceCount::TakeSettled();
     for (int i = 0; i < 20; ++i) {
         scheduler.CallAt(scheduler.Now() + 500, [&] { SignalEvent(done.Get()); });
         EXPECT_EQ(Wait(done.Get(), LongTimeout), WaitResult::Signalled);

@@ -185,7 +185,7 @@ TEST(NamedObjects, LeaveNothingBehind) {
         EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
     };
     TestThread(use).Join();  // a sanitizer starts a thread of its own with the first
-    const ResourceCount before = ResourceCount::Take();
+    const ResourceCount before = ResourceCount::TakeSettled();
     for (int i = 0; i < 20; ++i) {
         use();
     }

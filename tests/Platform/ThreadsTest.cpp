@@ -73,7 +73,7 @@ TEST_P(Threads, EndByForceOrSayThatTheyCannot) {
 TEST_P(Threads, LeaveNothingBehind) {
     std::atomic<bool> warmUp = false;
     Wait(OwnedHandle(StartThread(SetFlagLater, &warmUp)).Get(), LongTimeout);
-    const ResourceCount before = ResourceCount::Take();
+    const ResourceCount before = ResourceCount::TakeSettled();
     for (int i = 0; i < 50; ++i) {
         std::atomic<bool> waitedFor = false;
         std::atomic<bool> closedAtOnce = false;
