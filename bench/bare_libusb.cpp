@@ -1,7 +1,7 @@
 // What the library's readout and scan are compared with on real USB: the same transfers with libusb alone.
 //
-//     bare_libusb VID:PID readout COUNT  seconds of a readout, opening and closing included, the best of so
-//     many bare_libusb VID:PID scan BYTES     seconds of the transfers of one fixed scan
+//     bare_libusb VID:PID readout COUNT  seconds of the best of so many readouts, each from open to close
+//     bare_libusb VID:PID scan BYTES     seconds of the transfers of one fixed scan
 //
 // Prints the seconds as a decimal number; exit code 1 when a transfer fails.
 #include <libusb-1.0/libusb.h>
