@@ -210,6 +210,7 @@ void LibUsbDevice::Cancel(Transfer& transfer) {
     const std::lock_guard lock(mutex);
     if (auto* submission = static_cast<Submission*>(transfer.deviceData)) {
         libusb_cancel_transfer(submission->transfer);
+        events->HandleNow();
     }
 }
 

@@ -44,8 +44,17 @@ LibUsbEvents::LibUsbEvents(libusb_context* ownContext) : context(ownContext) {
 void LibUsbEvents::RunThread() {
     std::unique_lock lock(mutex);
     while (!stopping) {
-        if (!handlesAlways && (waiterHandles || steady_clock::now() < leftToWaiters)) {
-            changed.wait_until(lock, std::max(leftToWaiters, steady_clock::now() + Patience));
+        if (!handlesAlways && waiterHandles) {
+            const auto isLeft = [this] { return !waiterHandles || handlesAlways || stopping; };
+            if (!changed.wait_for(lock, Patience, isLeft)) {  // who waits briefly need not wake this thread
+                threadAwaitsWaiter = true;
+                changed.wait(lock, isLeft);
+                threadAwaitsWaiter = false;
+            }
+            continue;
+        }
+        if (!handlesAlways && steady_clock::now() < leftToWaiters) {
+            changed.wait_until(lock, leftToWaiters);
             continue;
         }
         threadHandles = true;
@@ -54,6 +63,12 @@ void LibUsbEvents::RunThread() {
         lock.lock();
         threadHandles = false;
     }
+}
+
+void LibUsbEvents::HandleNow() {
+    const std::lock_guard lock(mutex);
+    leftToWaiters = {};
+    changed.notify_all();
 }
 
 void LibUsbEvents::HandleAlways() {
@@ -103,7 +118,7 @@ void LibUsbEvents::WorkOff(Posix::Microseconds deadline) {
     const std::lock_guard lock(mutex);
     waiterHandles = false;
     leftToWaiters = steady_clock::now() + Patience;
-    if (stopping || handlesAlways) {
+    if (stopping || handlesAlways || threadAwaitsWaiter) {
         changed.notify_all();
     }
 }

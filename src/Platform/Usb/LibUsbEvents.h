@@ -21,6 +21,9 @@ class LibUsbEvents final : public Posix::CompletionSource {
     LibUsbEvents(const LibUsbEvents&) = delete;
     LibUsbEvents& operator=(const LibUsbEvents&) = delete;
 
+    /// The own thread takes up the events at once, unless a waiting thread handles them: an aborted transfer
+    /// is not always waited for in a way that works off events.
+    void HandleNow();
     /// The own thread no longer leaves the events to threads that may wait.
     void HandleAlways();
     /// Returns once no thread handles events, and none will.
@@ -41,7 +44,8 @@ class LibUsbEvents final : public Posix::CompletionSource {
     std::condition_variable changed;
     bool threadHandles = false;
     bool waiterHandles = false;
-    Time leftToWaiters{};  ///< the own thread sleeps until then
+    bool threadAwaitsWaiter = false;  ///< the own thread sleeps until the waiting thread leaves
+    Time leftToWaiters{};             ///< the own thread sleeps until then
     bool handlesAlways = false;
     bool stopping = false;
 
