@@ -1,9 +1,11 @@
 // What the library's readout and scan are compared with on real USB: the same transfers with libusb alone.
 //
-//     bare_libusb VID:PID readout COUNT  seconds of the best of so many readouts, each from open to close
-//     bare_libusb VID:PID scan BYTES     seconds of the transfers of one fixed scan
+//     bare_libusb VID:PID native COUNT  so many readouts as the library takes them on its native transport
+//     bare_libusb VID:PID usbio COUNT   the same on its USBIO transport
+//     bare_libusb VID:PID scan BYTES    one fixed scan
 //
-// Prints the seconds as a decimal number; exit code 1 when a transfer fails.
+// Prints for each the seconds as a decimal number: of a readout from open to close, of a scan those of its
+// transfers. Exit code 1 when a transfer fails.
 #include <libusb-1.0/libusb.h>
 
 #include <algorithm>
@@ -31,9 +33,15 @@ constexpr unsigned Timeout = 5000;
     std::exit(1);
 }
 
-void Command(libusb_device_handle* device, Request request, std::vector<std::uint8_t> data) {
-    std::this_thread::sleep_for(std::chrono::milliseconds(1));  // the pause that the library makes as well
-    const int moved = libusb_control_transfer(device, VendorOut, static_cast<std::uint8_t>(request), 0, 0,
+/// The pause that the library makes before each command as well.
+void Pause() {
+    std::this_thread::sleep_for(std::chrono::milliseconds(1));
+}
+
+void Command(libusb_device_handle* device, Request request, std::vector<std::uint8_t> data,
+             std::uint16_t value = 0) {
+    Pause();
+    const int moved = libusb_control_transfer(device, VendorOut, static_cast<std::uint8_t>(request), value, 0,
                                               data.data(), static_cast<std::uint16_t>(data.size()), Timeout);
     if (moved < 0) {
         Fail("control transfer", moved);
@@ -50,13 +58,27 @@ void LIBUSB_CALL Completed(libusb_transfer* transfer) {
     static_cast<Chunk*>(transfer->user_data)->done = 1;
 }
 
-void Start(libusb_device_handle* device, Chunk& chunk, std::size_t length) {
+void Start(libusb_device_handle* device, Chunk& chunk, std::uint8_t endpoint, std::size_t length) {
     chunk.done = 0;
-    libusb_fill_bulk_transfer(chunk.transfer, device, BulkInEndpoint, chunk.bytes.data(),
-                              static_cast<int>(length), &Completed, &chunk, 0);
+    libusb_fill_bulk_transfer(chunk.transfer, device, endpoint, chunk.bytes.data(), static_cast<int>(length),
+                              &Completed, &chunk, 0);
+    if (endpoint == InterruptInEndpoint) {
+        chunk.transfer->type = LIBUSB_TRANSFER_TYPE_INTERRUPT;
+    }
     if (const int code = libusb_submit_transfer(chunk.transfer)) {
         Fail("submit", code);
     }
+}
+
+void Await(libusb_context* context, Chunk& chunk) {
+    while (!chunk.done) {
+        libusb_handle_events_completed(context, &chunk.done);
+    }
+}
+
+void Abort(libusb_context* context, Chunk& chunk) {
+    libusb_cancel_transfer(chunk.transfer);
+    Await(context, chunk);
 }
 
 void Scan(libusb_context* context, libusb_device_handle* device, std::size_t total) {
@@ -68,15 +90,13 @@ void Scan(libusb_context* context, libusb_device_handle* device, std::size_t tot
     for (Chunk& chunk : chunks) {
         const std::size_t length = std::min<std::size_t>(ChunkSize, total - asked);
         if (length > 0) {
-            Start(device, chunk, length);
+            Start(device, chunk, BulkInEndpoint, length);
             asked += length;
         }
     }
     for (std::size_t current = 0; received < total; current ^= 1) {
         Chunk& chunk = chunks[current];
-        while (!chunk.done) {
-            libusb_handle_events_completed(context, &chunk.done);
-        }
+        Await(context, chunk);
         if (chunk.transfer->status != LIBUSB_TRANSFER_COMPLETED || chunk.transfer->actual_length <= 0) {
             Fail("bulk transfer", LIBUSB_ERROR_IO);
         }
@@ -85,15 +105,23 @@ void Scan(libusb_context* context, libusb_device_handle* device, std::size_t tot
         received += moved;
         const std::size_t length = std::min<std::size_t>(ChunkSize, total - asked);
         if (length > 0) {
-            Start(device, chunk, length);
+            Start(device, chunk, BulkInEndpoint, length);
             asked += length;
         }
     }
 }
 
-void Readout(libusb_device_handle* device) {
+/// The library listens to the button meanwhile: the native transport for a record of 8 bytes, until a closing
+/// that ends with an abort and a command; USBIO byte by byte, and once anew after its first command.
+void Readout(libusb_context* context, libusb_device_handle* device, bool isNative) {
+    static Chunk button;
     std::array<std::uint8_t, ReadoutBytes> buffer{};
+    Start(device, button, InterruptInEndpoint, isNative ? 8 : 1);
     Command(device, Request::Reset, {OpeningResetCode});
+    if (!isNative) {
+        Abort(context, button);
+        Start(device, button, InterruptInEndpoint, 1);
+    }
     std::this_thread::sleep_for(std::chrono::milliseconds(1000));
     Command(device, Request::SetMeasureParameters, {294 >> 8, 294 & 0xFF, 0, 0, 0, 1, 6, 0});
     Command(device, Request::Measure, {});
@@ -102,6 +130,13 @@ void Readout(libusb_device_handle* device) {
         libusb_bulk_transfer(device, BulkInEndpoint, buffer.data(), ReadoutBytes, &moved, Timeout);
     if (code != 0 || moved != static_cast<int>(ReadoutBytes)) {
         Fail("readout", code);
+    }
+    if (isNative) {
+        Pause();
+    }
+    Abort(context, button);
+    if (isNative) {
+        Command(device, Request::ButtonReport, {}, 3);
     }
 }
 
@@ -136,26 +171,27 @@ double Seconds(std::uint16_t vendor, std::uint16_t product, bool ofWorkAlone, co
 int main(int argc, char** argv) {
     unsigned vendorId = 0;
     unsigned productId = 0;
-    if (argc != 4 || std::sscanf(argv[1], "%x:%x", &vendorId, &productId) != 2) {
-        std::fprintf(stderr, "usage: bare_libusb VID:PID readout COUNT | scan BYTES\n");
+    const std::string_view what = argc == 4 ? argv[2] : "";
+    if ((what != "native" && what != "usbio" && what != "scan") ||
+        std::sscanf(argv[1], "%x:%x", &vendorId, &productId) != 2) {
+        std::fprintf(stderr, "usage: bare_libusb VID:PID native COUNT | usbio COUNT | scan BYTES\n");
         return 2;
     }
     const auto vendor = static_cast<std::uint16_t>(vendorId);
     const auto product = static_cast<std::uint16_t>(productId);
     const auto number = std::strtoull(argv[3], nullptr, 10);
-    double best = 1e9;
-    if (std::string_view(argv[2]) == "scan") {
-        best =
-            Seconds(vendor, product, true, [number](libusb_context* context, libusb_device_handle* device) {
-                Scan(context, device, number);
-            });
-    } else {
-        for (unsigned long long i = 0; i < number; ++i) {
-            best = std::min(best,
-                            Seconds(vendor, product, false,
-                                    [](libusb_context*, libusb_device_handle* device) { Readout(device); }));
-        }
+    if (what == "scan") {
+        std::printf("%.6f\n", Seconds(vendor, product, true,
+                                      [number](libusb_context* context, libusb_device_handle* device) {
+                                          Scan(context, device, number);
+                                      }));
+        return 0;
     }
-    std::printf("%.6f\n", best);
+    for (unsigned long long i = 0; i < number; ++i) {
+        std::printf("%.6f\n", Seconds(vendor, product, false,
+                                      [what](libusb_context* context, libusb_device_handle* device) {
+                                          Readout(context, device, what == "native");
+                                      }));
+    }
     return 0;
 }
