@@ -9,6 +9,8 @@
 #include <utility>
 #include <vector>
 
+#include "DataFaults.h"
+#include "Passage.h"
 #include "Platform/Threads.h"
 
 namespace Varnholt::Simulator {
@@ -23,45 +25,9 @@ namespace Errors = Platform::Errors;
 
 namespace {
 
-using Bytes = std::vector<std::uint8_t>;
-
 /// Milliseconds: no host asks an interrupt endpoint more often, so that no fault can make it answer without a
 /// pause.
 constexpr std::uint32_t InterruptInterval = 1;
-
-void FillWithGarbage(std::uint8_t* data, std::size_t length, std::uint32_t seed) {
-    std::uint32_t state = seed * 2654435761U + 1;
-    for (std::size_t i = 0; i < length; ++i) {
-        state = state * 1664525U + 1013904223U;
-        data[i] = static_cast<std::uint8_t>(state >> 24);
-    }
-}
-
-void FlipBit(std::uint8_t* data, std::size_t length, std::uint32_t bit) {
-    if (length > 0) {
-        data[bit / 8 % length] ^= static_cast<std::uint8_t>(1U << bit % 8);
-    }
-}
-
-/// A transfer on its way through the injector: the copy that the device gets, and how far it is.
-struct Passage : Transfer {
-    enum class State {
-        Held,          ///< not with the device
-        Submitting,    ///< being handed to the device
-        InDevice,      ///< accepted by the device
-        HeldWithData,  ///< done by the device, waits for its cancellation
-    };
-
-    Transfer* original = nullptr;
-    std::optional<Fault> fault;
-    State state = State::Held;
-    bool cancelWanted = false;
-    bool polled = false;  // an interrupt transfer that was held until its endpoint was polled
-    Bytes replacedData;   // of an OUT transfer whose data are changed
-
-    bool Has(FaultKind kind) const { return fault && fault->kind == kind; }
-};
-using PassagePointer = std::shared_ptr<Passage>;
 
 bool IsStandardRequest(const Transfer& transfer) {
     constexpr std::uint8_t typeMask = 0x60;
@@ -83,7 +49,7 @@ class FaultInjector final : public UsbDevice, private TransferClient {
           script(std::move(faultScript)),
           scheduler(eventScheduler),
           unplug(std::move(unplugDevice)),
-          keepsData(script->Plan().Uses(FaultKind::Stale)) {}
+          dataFaults(*script) {}
     ~FaultInjector() override;
 
     std::vector<EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
@@ -100,7 +66,6 @@ class FaultInjector final : public UsbDevice, private TransferClient {
 
     ErrorCode Begin(const PassagePointer& passage);
     ErrorCode PassOn(const PassagePointer& passage);
-    void ReplaceOutData(Passage& passage);
     bool AnswerWithLastData(const PassagePointer& passage);
     void HoldFor(const PassagePointer& passage, std::uint32_t milliseconds);
     void TimeHasCome(const PassagePointer& passage);
@@ -118,13 +83,12 @@ class FaultInjector final : public UsbDevice, private TransferClient {
     const std::shared_ptr<FaultScript> script;
     Platform::EventScheduler& scheduler;
     const std::function<void()> unplug;
-    const bool keepsData;
+    DataFaults dataFaults;
 
     std::mutex mutex;  // guards what follows; not held while the device, a client or the scheduler is called
     std::map<const Transfer*, PassagePointer> passages;  // under way, by the submitter's own
     std::map<const Passage*, EventId> alarms;
     std::set<std::uint8_t> halted;
-    std::map<std::pair<std::uint8_t, bool>, Bytes> lastData;  // by endpoint and direction
     bool gone = false;
 
     std::atomic<int> completing = 0;  // completions by the device that are being dealt with
@@ -236,12 +200,12 @@ ErrorCode FaultInjector::Begin(const PassagePointer& passage) {
             if (passage->IsIn()) {
                 return AnswerWithLastData(passage) ? Errors::Success : PassOn(passage);
             }
-            ReplaceOutData(*passage);
+            dataFaults.ReplaceOut(*passage);
             return PassOn(passage);
         case FaultKind::Garbage:
         case FaultKind::Flip:
             if (!passage->IsIn()) {
-                ReplaceOutData(*passage);
+                dataFaults.ReplaceOut(*passage);
             }
             return PassOn(passage);
         case FaultKind::GoneBefore:
@@ -272,8 +236,8 @@ ErrorCode FaultInjector::PassOn(const PassagePointer& passage) {
             return Errors::Success;  // cancelled while it was held
         }
         passage->state = Passage::State::Submitting;
-        if (keepsData && !passage->IsIn()) {
-            lastData[{passage->endpoint, false}].assign(passage->data, passage->data + passage->length);
+        if (!passage->IsIn()) {
+            dataFaults.KeepOut(*passage);
         }
         if (passage->endpoint == 0 && passage->setup.requestType == standardRequestToEndpoint &&
             passage->setup.request == clearFeature) {
@@ -299,34 +263,13 @@ ErrorCode FaultInjector::PassOn(const PassagePointer& passage) {
     return Errors::Success;
 }
 
-void FaultInjector::ReplaceOutData(Passage& passage) {
-    Bytes& data = passage.replacedData;
-    data.assign(passage.data, passage.data + passage.length);
-    if (passage.Has(FaultKind::Garbage)) {
-        FillWithGarbage(data.data(), data.size(), script->Hits());
-    } else if (passage.Has(FaultKind::Flip)) {
-        FlipBit(data.data(), data.size(), passage.fault->argument.value_or(0));
-    } else {
-        const std::lock_guard lock(mutex);
-        data = lastData[{passage.endpoint, false}];
-        data.resize(passage.length);
-    }
-    passage.data = data.data();
-}
-
 /// False when there are none to repeat.
 bool FaultInjector::AnswerWithLastData(const PassagePointer& passage) {
-    std::uint32_t length = 0;
-    {
-        const std::lock_guard lock(mutex);
-        const auto last = lastData.find({passage->endpoint, true});
-        if (last == lastData.end()) {
-            return false;
-        }
-        length = static_cast<std::uint32_t>(std::min<std::size_t>(passage->length, last->second.size()));
-        std::copy_n(last->second.begin(), length, passage->data);
+    const std::optional<std::uint32_t> length = dataFaults.RepeatIn(*passage);
+    if (!length) {
+        return false;
     }
-    End(*passage, TransferStatus::Completed, length);
+    End(*passage, TransferStatus::Completed, *length);
     return true;
 }
 
@@ -423,19 +366,8 @@ void FaultInjector::ChangeOutcome(Passage& passage) {
     } else if (passage.Has(FaultKind::Long) && passage.status == TransferStatus::Completed) {
         passage.status = TransferStatus::Overflow;
     }
-    if (!passage.IsIn()) {
-        return;
-    }
-    if (passage.Has(FaultKind::Garbage)) {
-        FillWithGarbage(passage.data, passage.actualLength, script->Hits());
-    } else if (passage.Has(FaultKind::Flip)) {
-        FlipBit(passage.data, passage.actualLength, passage.fault->argument.value_or(0));
-    }
-    if (keepsData) {
-        try {
-            lastData[{passage.endpoint, true}].assign(passage.data, passage.data + passage.actualLength);
-        } catch (const std::bad_alloc&) {  // older data are as stale
-        }
+    if (passage.IsIn()) {
+        dataFaults.ChangeIn(passage);
     }
 }
 

@@ -1,0 +1,44 @@
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <mutex>
+#include <optional>
+#include <utility>
+#include <vector>
+
+#include "FaultPlan.h"
+#include "Passage.h"
+
+namespace Varnholt::Simulator {
+
+/// The faults of a transfer's data: data that mean nothing, a wrong bit, the data of the transfer before. Any
+/// thread.
+class DataFaults final {
+  public:
+    /// The script must outlive the object.
+    explicit DataFaults(const FaultScript& faultScript)
+        : script(faultScript), keepsData(script.Plan().Uses(FaultKind::Stale)) {}
+
+    /// Gives a transfer out the wrong data in place of its own.
+    void ReplaceOut(Passage& passage);
+    /// Remembers what a transfer takes out.
+    void KeepOut(const Passage& passage);
+
+    /// Fills in the data of the transfer before and answers how many bytes they are; nothing when there are
+    /// none to repeat.
+    std::optional<std::uint32_t> RepeatIn(Passage& passage);
+    /// Spoils what a transfer has brought in, and remembers it.
+    void ChangeIn(Passage& passage);
+
+  private:
+    using Bytes = std::vector<std::uint8_t>;
+
+    const FaultScript& script;
+    const bool keepsData;
+
+    std::mutex mutex;                                         // guards what follows
+    std::map<std::pair<std::uint8_t, bool>, Bytes> lastData;  // by endpoint, and whether it came in
+};
+
+}  // namespace Varnholt::Simulator
