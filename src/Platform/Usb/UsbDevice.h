@@ -103,7 +103,7 @@ class UsbBus {
     /// The names of the instruments that are present, in a stable order. A name says where the instrument is
     /// plugged in and survives replugging; it has no slash or backslash.
     virtual std::vector<std::string> List() = 0;
-    /// Whether it is one of them; where that is found out faster than all of them.
+    /// Whether an instrument of that name is present. A bus that need not look for all of them does not.
     virtual bool Has(const std::string& name) {
         const std::vector<std::string> names = List();
         return std::find(names.begin(), names.end(), name) != names.end();

@@ -1,7 +1,9 @@
 #include <gtest/gtest.h>
 #include <libusb-1.0/libusb.h>
 
+#include <chrono>
 #include <memory>
+#include <thread>
 
 #include "Platform/Threads.h"
 #include "Platform/Usb/LibUsbEvents.h"
@@ -70,6 +72,17 @@ TEST_F(LibUsbEventsTest, AWaitEndsInTimeAndOutlastsTheEvents) {
         ASSERT_EQ(Wait(back.Get(), LongTimeout), WaitResult::Signalled) << "round " << i;
     }
     EXPECT_EQ(Wait(echo.Get(), LongTimeout), WaitResult::Signalled);
+}
+
+/// An aborted transfer, or the button's, may end when nobody waits.
+TEST_F(LibUsbEventsTest, AfterALongWaitTheirOwnThreadHandlesThemAgain) {
+    Posix::WorkOffInWaits(events);
+    EXPECT_EQ(Wait(back.Get(), 50), WaitResult::TimedOut);
+    const auto patienceEnds = std::chrono::steady_clock::now() + std::chrono::milliseconds(LongTimeout);
+    while (libusb_event_handler_active(context) == 0 && std::chrono::steady_clock::now() < patienceEnds) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(1));
+    }
+    EXPECT_NE(libusb_event_handler_active(context), 0);
 }
 
 }  // namespace
