@@ -79,13 +79,13 @@ void Session::Report(const FailureReport& report) {
 }
 
 Progress Session::MakeProgress(const std::string& title, std::uint64_t total, const std::string& unit) {
-    return {where.err, where.errFacts.isTerminal, title, total, unit};
+    return {where.err, where.errFacts, title, total, unit};
 }
 
 PlotStyle Session::StyleOfPlots() const {
     PlotStyle style;
     style.braille = where.outFacts.showsUtf8;
-    style.width = std::min(where.outFacts.columns - 1, WidestPlot);
+    style.width = std::min(where.outFacts.size().columns - 1, WidestPlot);
     return style;
 }
 

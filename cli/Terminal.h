@@ -10,12 +10,21 @@ namespace Varnholt::Cli {
 /// place.
 void SecureStandardStreams();
 
+struct TerminalSize {
+    int columns = 80;
+    int rows = 24;
+
+    bool operator==(const TerminalSize&) const = default;
+};
+
 /// What an output stream is connected to.
 struct StreamFacts {
     bool isTerminal = false;
-    bool showsColor = false;  ///< a terminal, and the user has not set NO_COLOR
-    bool showsUtf8 = false;   ///< also for a file or pipe: what the environment says of characters
-    int columns = 80;
+    bool movesCursor = false;  ///< a terminal that can be drawn on: not TERM=dumb
+    bool showsColor = false;   ///< a terminal, and the user has not set NO_COLOR
+    bool showsUtf8 = false;    ///< also for a file or pipe: what the environment says of characters
+    /// To be asked each time: a window changes its size.
+    std::function<TerminalSize()> size = [] { return TerminalSize{}; };
 };
 StreamFacts FactsOfStandardOutput();
 StreamFacts FactsOfStandardError();

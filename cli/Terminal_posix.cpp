@@ -37,15 +37,24 @@ bool EnvironmentSaysUtf8() {
     return false;
 }
 
+/// The usual size where the terminal does not say.
+TerminalSize SizeOf(int descriptor) {
+    TerminalSize size;
+    winsize asked{};
+    if (::ioctl(descriptor, TIOCGWINSZ, &asked) == 0 && asked.ws_col > 0) {
+        size.columns = asked.ws_col;
+        size.rows = asked.ws_row > 0 ? asked.ws_row : size.rows;
+    }
+    return size;
+}
+
 StreamFacts FactsOf(int descriptor) {
     StreamFacts facts;
     facts.isTerminal = ::isatty(descriptor) != 0;
-    facts.showsColor = facts.isTerminal && Environment("NO_COLOR").empty() && Environment("TERM") != "dumb";
+    facts.movesCursor = facts.isTerminal && Environment("TERM") != "dumb";
+    facts.showsColor = facts.movesCursor && Environment("NO_COLOR").empty();
     facts.showsUtf8 = EnvironmentSaysUtf8();
-    winsize size{};
-    if (facts.isTerminal && ::ioctl(descriptor, TIOCGWINSZ, &size) == 0 && size.ws_col > 0) {
-        facts.columns = size.ws_col;
-    }
+    facts.size = [descriptor] { return SizeOf(descriptor); };
     return facts;
 }
 

@@ -12,21 +12,29 @@
 namespace Varnholt::Cli {
 namespace {
 
+/// The usual size where there is no console.
+TerminalSize SizeOf(HANDLE stream) {
+    TerminalSize size;
+    CONSOLE_SCREEN_BUFFER_INFO info{};
+    if (::GetConsoleScreenBufferInfo(stream, &info) != 0) {
+        size.columns = info.srWindow.Right - info.srWindow.Left + 1;
+        size.rows = info.srWindow.Bottom - info.srWindow.Top + 1;
+    }
+    return size;
+}
+
 StreamFacts FactsOf(DWORD which) {
     StreamFacts facts;
     const HANDLE stream = ::GetStdHandle(which);
     DWORD mode = 0;
     facts.isTerminal = ::GetConsoleMode(stream, &mode) != 0;
-    // Colours need a console that understands escape sequences (0x0004), which old ones do not.
+    // Drawing and colours need a console that understands escape sequences (0x0004), which old ones do not.
     constexpr DWORD escapeSequences = 0x0004;
+    facts.movesCursor = facts.isTerminal && ::SetConsoleMode(stream, mode | escapeSequences) != 0;
     const char* const noColor = std::getenv("NO_COLOR");
-    facts.showsColor = facts.isTerminal && (noColor == nullptr || *noColor == '\0') &&
-                       ::SetConsoleMode(stream, mode | escapeSequences) != 0;
+    facts.showsColor = facts.movesCursor && (noColor == nullptr || *noColor == '\0');
     facts.showsUtf8 = ::GetConsoleOutputCP() == CP_UTF8;
-    CONSOLE_SCREEN_BUFFER_INFO info{};
-    if (facts.isTerminal && ::GetConsoleScreenBufferInfo(stream, &info) != 0) {
-        facts.columns = info.srWindow.Right - info.srWindow.Left + 1;
-    }
+    facts.size = [stream] { return SizeOf(stream); };
     return facts;
 }
 

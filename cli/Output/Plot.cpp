@@ -138,7 +138,7 @@ void PrintPlot(std::ostream& stream, std::span<const double> values, const PlotS
     const bool hasMiddle = height > 2;
     const auto labelWidth =
         static_cast<int>(std::max({top.size(), hasMiddle ? middle.size() : 0, bottom.size()}));
-    const int room = std::max(style.width - static_cast<int>(style.indent.size()) - labelWidth - 2, 8);
+    const int room = std::max(style.width - static_cast<int>(style.indent.size()) - labelWidth - 2, 1);
     const int perCell = style.braille ? DotColumns : 1;
     const auto count = static_cast<int>(std::min<std::size_t>(values.size(), 100000));
     const int width = std::clamp((count + perCell - 1) / perCell, 1, room);
@@ -169,8 +169,10 @@ void PrintPlot(std::ostream& stream, std::span<const double> values, const PlotS
             const std::string index = std::to_string(static_cast<std::int64_t>(column) * count / width);
             const std::size_t at = style.indent.size() + static_cast<std::size_t>(labelWidth) + 2 +
                                    static_cast<std::size_t>(column);
-            labels.resize(std::max(labels.size(), at), ' ');
-            labels += index;
+            if (column == 0 || at + index.size() <= static_cast<std::size_t>(std::max(style.width, 0))) {
+                labels.resize(std::max(labels.size(), at), ' ');
+                labels += index;
+            }
         }
     }
     stream << axis << '\n' << labels << '\n';

@@ -15,7 +15,8 @@ struct PlotStyle {
 };
 
 /// Draws the values as a line over their index, scaled to fit, with labels on both axes. Values that are no
-/// numbers leave a gap. Always `height` + 2 lines, so that a plot can be drawn over an earlier one.
+/// numbers leave a gap. Always `height` + 2 lines, and no wider than `width` from 20 columns on, so that a
+/// plot can be drawn over an earlier one.
 void PrintPlot(std::ostream& stream, std::span<const double> values, const PlotStyle& style);
 
 /// Lines that `PrintPlot` prints.

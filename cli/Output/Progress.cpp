@@ -10,6 +10,18 @@ namespace {
 
 constexpr std::chrono::milliseconds DrawInterval{100};
 constexpr std::size_t BarWidth = 24;
+constexpr std::size_t ShortestBar = 4;
+
+/// Behind a character in the last column some terminals begin a new line.
+std::size_t UsableColumns(const StreamFacts& facts) {
+    return static_cast<std::size_t>(std::max(facts.size().columns - 1, 1));
+}
+
+std::string Bar(std::uint64_t done, std::uint64_t total, std::size_t width) {
+    const auto filled = static_cast<std::size_t>(static_cast<double>(done) * static_cast<double>(width) /
+                                                 static_cast<double>(total));
+    return "[" + std::string(filled, '=') + std::string(width - filled, ' ') + "]  ";
+}
 
 }  // namespace
 
@@ -29,51 +41,56 @@ std::string SizeText(double bytes) {
     return fmt::format("{:.1f} {}", bytes, unit);
 }
 
-Progress::Progress(std::ostream& terminal, bool isTerminal, std::string what, std::uint64_t all,
+Progress::Progress(std::ostream& terminal, StreamFacts facts, std::string what, std::uint64_t all,
                    std::string unitText)
-    : stream(terminal), draws(isTerminal), title(std::move(what)), total(all), unit(std::move(unitText)) {}
+    : stream(terminal),
+      terminalFacts(std::move(facts)),
+      title(std::move(what)),
+      total(all),
+      unit(std::move(unitText)) {}
 
 Progress::~Progress() {
     if (drawn > 0) {
-        stream << '\r' << std::string(drawn, ' ') << '\r' << std::flush;
+        stream << '\r' + std::string(std::min(drawn, UsableColumns(terminalFacts)), ' ') + '\r' << std::flush;
     }
 }
 
 std::string Progress::LineFor(const std::string& title, std::uint64_t done, std::uint64_t total,
-                              const std::string& unit, double seconds) {
+                              const std::string& unit, double seconds, std::size_t columns) {
     const bool isBytes = unit == "B";
     const auto amount = [&](std::uint64_t count) {
         return isBytes ? SizeText(static_cast<double>(count)) : std::to_string(count);
     };
-    std::string line = title + "  ";
+    const std::string head = title + "  ";
+    std::string numbers = amount(done);
     if (total > 0) {
-        const std::uint64_t shown = std::min(done, total);
-        const auto filled =
-            static_cast<std::size_t>(static_cast<double>(shown) * BarWidth / static_cast<double>(total));
-        line += "[" + std::string(filled, '=') + std::string(BarWidth - filled, ' ') + "]  ";
-        line += amount(done) + " of " + amount(total);
-    } else {
-        line += amount(done);
+        numbers += " of " + amount(total);
     }
     if (!isBytes) {
-        line += " " + unit;
+        numbers += " " + unit;
     } else if (seconds > 0) {
-        line += "  " + SizeText(static_cast<double>(done) / seconds) + "/s";
+        numbers += "  " + SizeText(static_cast<double>(done) / seconds) + "/s";
     }
-    return line;
+    constexpr std::size_t around = 4;  // of a bar
+    const std::size_t used = head.size() + numbers.size() + around;
+    const std::size_t room = columns > used ? columns - used : 0;
+    const bool hasBar = total > 0 && room >= ShortestBar;
+    return (head + (hasBar ? Bar(std::min(done, total), total, std::min(room, BarWidth)) : "") + numbers)
+        .substr(0, columns);
 }
 
 void Progress::Update(std::uint64_t done) {
     const Clock::time_point now = Clock::now();
-    if (!draws || (now < next && (total == 0 || done < total))) {
+    if (!terminalFacts.movesCursor || (now < next && (total == 0 || done < total))) {
         return;
     }
     next = now + DrawInterval;
-    const std::string line =
-        LineFor(title, done, total, unit, std::chrono::duration<double>(now - start).count());
-    const std::size_t rest = drawn > line.size() ? drawn - line.size() : 0;
-    stream << '\r' << line << std::string(rest, ' ') << std::flush;
-    drawn = std::max(drawn, line.size());
+    const std::size_t columns = UsableColumns(terminalFacts);
+    std::string line =
+        LineFor(title, done, total, unit, std::chrono::duration<double>(now - start).count(), columns);
+    drawn = std::max(std::min(drawn, columns), line.size());
+    line.resize(drawn, ' ');  // over what is longer from before
+    stream << '\r' + line << std::flush;
 }
 
 }  // namespace Varnholt::Cli

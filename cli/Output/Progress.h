@@ -5,14 +5,16 @@
 #include <iosfwd>
 #include <string>
 
+#include "Terminal.h"
+
 namespace Varnholt::Cli {
 
-/// How far something has come, on one line of a terminal that is drawn over and over. Prints nothing anywhere
-/// else.
+/// How far something has come, on one line of a terminal that is drawn over and over, and never longer than
+/// the terminal is wide. Prints nothing anywhere else.
 class Progress final {
   public:
     /// `total` 0: not known. `unit` stands behind the numbers, "B" with a rate of bytes per second.
-    Progress(std::ostream& terminal, bool isTerminal, std::string title, std::uint64_t total,
+    Progress(std::ostream& terminal, StreamFacts facts, std::string title, std::uint64_t total,
              std::string unit);
     /// Clears the line.
     ~Progress();
@@ -22,15 +24,16 @@ class Progress final {
     /// Cheap: draws at most ten times a second, and always when the total is reached.
     void Update(std::uint64_t done);
 
-    /// The line that `Update` draws, without control characters.
+    /// The line that `Update` draws, without control characters: at most `columns` of them, with a shorter
+    /// bar, with none, or cut off where it would be longer.
     static std::string LineFor(const std::string& title, std::uint64_t done, std::uint64_t total,
-                               const std::string& unit, double seconds);
+                               const std::string& unit, double seconds, std::size_t columns);
 
   private:
     using Clock = std::chrono::steady_clock;
 
     std::ostream& stream;
-    const bool draws;
+    const StreamFacts terminalFacts;
     const std::string title;
     const std::uint64_t total;
     const std::string unit;

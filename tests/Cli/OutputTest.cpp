@@ -7,6 +7,7 @@
 #include "Failure.h"
 #include "Output/AtomicFile.h"
 #include "Output/Json.h"
+#include "Output/LiveBlock.h"
 #include "Output/Plot.h"
 #include "Output/Progress.h"
 #include "Output/Table.h"
@@ -60,30 +61,39 @@ TEST(PlotTest, BrailleUsesTwoByFourDots) {
         << Plot({0, 1, 2, 3, 4, 5, 6, 7}, true, 60, 2);
 }
 
-TEST(PlotTest, AlwaysHasAsManyLinesAsItSays) {
-    const double nan = std::numeric_limits<double>::quiet_NaN();
-    const double huge = std::numeric_limits<double>::max();
-    for (const std::vector<double>& values : std::vector<std::vector<double>>{
-             {}, {5}, {5, 5, 5}, {nan, nan}, {1, nan, 3}, {-huge, huge}, {nan, INFINITY, -INFINITY}}) {
-        for (const int width : {-5, 0, 20, 200}) {
-            for (const bool braille : {false, true}) {
-                const std::string text = Plot(values, braille, width, 5);
-                EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), PlotLines({braille, width, 5, ""}))
-                    << testing::PrintToString(values);
-            }
-        }
-    }
+/// Characters, of a text that holds none that are wider.
+std::size_t Columns(const std::string& line) {
+    return static_cast<std::size_t>(
+        std::count_if(line.begin(), line.end(), [](char c) { return (c & 0xC0) != 0x80; }));
 }
 
-TEST(PlotTest, ManyValuesFitIntoTheWidth) {
-    std::vector<double> values(1000);
-    values[997] = 9;  // a spike is not lost by drawing several values in one column
-    std::istringstream lines(Plot(values, false, 40));
-    std::string top;
-    std::getline(lines, top);
-    EXPECT_NE(top.find('*'), std::string::npos);
-    for (std::string line; std::getline(lines, line);) {
-        EXPECT_LE(line.size(), 44u);
+std::vector<std::string> LinesOf(const std::string& text) {
+    std::istringstream stream(text);
+    std::vector<std::string> lines;
+    for (std::string line; std::getline(stream, line);) {
+        lines.push_back(line);
+    }
+    return lines;
+}
+
+TEST(PlotTest, HasTheLinesThatItSaysAndFitsIntoItsWidth) {
+    const double nan = std::numeric_limits<double>::quiet_NaN();
+    const double huge = std::numeric_limits<double>::max();
+    std::vector<double> spike(1000);
+    spike[997] = 9;  // is not lost by drawing several values in one column
+    for (const std::vector<double>& values : std::vector<std::vector<double>>{
+             {}, {5}, {5, 5, 5}, {nan, nan}, {1, nan, 3}, {-huge, huge}, {nan, INFINITY, -INFINITY}, spike}) {
+        for (const int width : {-5, 0, 19, 20, 39, 64, 200}) {
+            for (const bool braille : {false, true}) {
+                const std::string text = Plot(values, braille, width, 5);
+                EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), PlotLines({braille, width, 5, ""}));
+                const auto lines = LinesOf(text);
+                EXPECT_TRUE(braille || values != spike || lines[0].find('*') != std::string::npos) << text;
+                for (const std::string& line : lines) {
+                    EXPECT_LE(Columns(line), static_cast<std::size_t>(std::max(width, 19))) << text;
+                }
+            }
+        }
     }
 }
 
@@ -101,27 +111,60 @@ TEST(ProgressTest, Lines) {
         std::uint64_t done, total;
         const char* unit;
         double seconds;
+        std::size_t columns;
         const char* line;
     };
     for (const Case& row : {
-             Case{0, 32, "pieces", 0, "w  [                        ]  0 of 32 pieces"},
-             Case{16, 32, "pieces", 1, "w  [============            ]  16 of 32 pieces"},
-             Case{1024, 0, "B", 2, "w  1.0 kB  512 B/s"},
-             Case{999'999'999, 1'000'000'000, "B", 10,
+             Case{0, 32, "pieces", 0, 79, "w  [                        ]  0 of 32 pieces"},
+             Case{16, 32, "pieces", 1, 79, "w  [============            ]  16 of 32 pieces"},
+             Case{1024, 0, "B", 2, 79, "w  1.0 kB  512 B/s"},
+             Case{999'999'999, 1'000'000'000, "B", 10, 79,
                   "w  [======================= ]  1.0 GB of 1.0 GB  100.0 MB/s"},
-             Case{40, 32, "pieces", 1, "w  [========================]  40 of 32 pieces"},
+             Case{40, 32, "pieces", 1, 79, "w  [========================]  40 of 32 pieces"},
+             Case{16, 32, "pieces", 1, 30, "w  [====    ]  16 of 32 pieces"},
+             Case{16, 32, "pieces", 1, 24, "w  16 of 32 pieces"},
+             Case{999'999'999, 1'000'000'000, "B", 10, 19, "w  1.0 GB of 1.0 GB"},
          }) {
-        EXPECT_EQ(Progress::LineFor("w", row.done, row.total, row.unit, row.seconds), row.line);
+        EXPECT_EQ(Progress::LineFor("w", row.done, row.total, row.unit, row.seconds, row.columns), row.line);
     }
 }
 
 TEST(ProgressTest, SilentUnlessOnATerminalAndGoneAtTheEnd) {
-    std::ostringstream file, terminal;
-    { Progress(file, false, "w", 2, "pieces").Update(2); }
-    EXPECT_EQ(file.str(), "");
-    { Progress(terminal, true, "w", 2, "pieces").Update(2); }
-    EXPECT_TRUE(terminal.str().starts_with("\rw  ["));
-    EXPECT_TRUE(terminal.str().ends_with(" \r")) << "the line stays";
+    StreamFacts facts;
+    facts.isTerminal = true;
+    std::ostringstream plain, terminal;
+    { Progress(plain, facts, "w", 2, "pieces").Update(2); }
+    EXPECT_EQ(plain.str(), "") << "cannot be drawn on";
+    facts.movesCursor = true;
+    int columns = 200;
+    facts.size = [&columns] { return TerminalSize{columns, 24}; };
+    {
+        Progress progress(terminal, facts, "w", 2, "pieces");
+        progress.Update(2);
+        columns = 10;
+        terminal.str({});
+        progress.Update(2);
+        EXPECT_EQ(terminal.str(), "\rw  2 of 2");
+        terminal.str({});
+    }
+    EXPECT_EQ(terminal.str(), "\r" + std::string(9, ' ') + "\r") << "the line stays";
+}
+
+TEST(LiveBlockTest, IsDrawnOverUnlessTheTerminalHasChangedOrCannot) {
+    StreamFacts facts;
+    facts.isTerminal = true;
+    EXPECT_EQ(LiveBlock(facts).Over("a\n"), "a\n");
+    facts.movesCursor = true;
+    TerminalSize size;
+    facts.size = [&size] { return size; };
+    LiveBlock block(facts);
+    EXPECT_EQ(block.Over("a\nb\n"), "a\nb\n");
+    EXPECT_EQ(block.Over("c\n"), "\r\x1b[2A\x1b[Jc\n");
+    EXPECT_EQ(block.Over("d\n"), "\r\x1b[1A\x1b[Jd\n");
+    size.columns = 20;
+    EXPECT_EQ(block.Over("e\n"), "\x1b[H\x1b[2Je\n");
+    EXPECT_EQ(block.Over("f\n"), "\r\x1b[1A\x1b[Jf\n");
+    EXPECT_EQ(Wrapped("lowest 5 at 3, mean 12", 12), "lowest 5 at\n3, mean 12\n");
 }
 
 class AtomicFileTest : public testing::Test {

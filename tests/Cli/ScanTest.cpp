@@ -93,7 +93,7 @@ TEST_P(ScanTest, SummaryAsJson) {
 }
 
 TEST_P(ScanTest, ProgressOnATerminalOnly) {
-    tool.errFacts.isTerminal = true;
+    tool.errFacts.movesCursor = true;
     host.Add("sim", Streaming(1'000'000));
     Succeed({"scan", "--total", "512000", "--output", folder.Path("csv")});
     EXPECT_THAT(tool.Err(), HasSubstr("512.0 kB of 512.0 kB"));
