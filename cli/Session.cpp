@@ -59,6 +59,7 @@ void Session::Print(const nlohmann::ordered_json& value) {
 void Session::FlushOut() {
     where.out.flush();
     if (!where.out) {
+        interruption.ThrowIfRequested();
         throw ToolFailure(ExitCode::File, "the output cannot be written");
     }
 }

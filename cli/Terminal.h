@@ -7,7 +7,8 @@
 namespace Varnholt::Cli {
 
 /// To be called before anything is opened: what is printed never goes into a file that took a closed stream's
-/// place.
+/// place, and output that nobody reads any more, or that has no room left, is a failure to write instead of
+/// the end of the process.
 void SecureStandardStreams();
 
 struct TerminalSize {

@@ -77,6 +77,8 @@ sigset_t WatchedSignals() {
 
 void SecureStandardStreams() {
     Platform::SecureStandardStreams();
+    ::signal(SIGPIPE, SIG_IGN);
+    ::signal(SIGXFSZ, SIG_IGN);
 }
 
 StreamFacts FactsOfStandardOutput() {

@@ -86,6 +86,7 @@ ExitCode Run(std::vector<std::string> arguments, Surroundings& surroundings, Ses
         const bool isHelp = error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success);
         if (isHelp) {
             app.exit(error, surroundings.out, surroundings.err);
+            session.FlushOut();
             return ExitCode::Success;
         }
         session.Report(ReportOf(app, error));

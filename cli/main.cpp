@@ -1,6 +1,7 @@
 #include <exception>
 #include <iostream>
 
+#include "Output/DescriptorStream.h"
 #include "Tool.h"
 
 using namespace Varnholt::Cli;
@@ -10,7 +11,15 @@ int main(int argc, char** argv) {
     try {
         Interruption interruption;
         const SignalWatch watch([&interruption] { interruption.Request(); });
-        Surroundings surroundings{std::cout, std::cerr, FactsOfStandardOutput(), FactsOfStandardError()};
+        // Both can be stopped, by a reader that does not read or a terminal that is held: then too the user's
+        // wish to end is seen.
+        DescriptorStream out(OutputDescriptor::StandardOutput(), interruption,
+                             DescriptorStream::Lost::IsFailure);
+        DescriptorStream err(OutputDescriptor::StandardError(), interruption,
+                             DescriptorStream::Lost::IsIgnored);
+        err << std::unitbuf;
+        err.tie(&out);
+        Surroundings surroundings{out, err, FactsOfStandardOutput(), FactsOfStandardError()};
         return static_cast<int>(RunTool({argv + 1, argv + argc}, surroundings, interruption));
     } catch (const std::exception& exception) {
         std::cerr << "ostra: " << exception.what() << '\n';

@@ -18,23 +18,13 @@ std::string ReasonOfLastFailure() {
 
 }  // namespace
 
-AtomicFile::AtomicFile(const std::string& name, IfItExists policy)
-    : shownName(name), ifItExists(policy), target(name) {
-    std::error_code error;
-    const Files::file_status status = Files::status(target, error);
-    if (Files::is_directory(status)) {
-        throw ToolFailure(ExitCode::File, name + " is a directory", "name a file");
+AtomicFile::AtomicFile(const std::string& name, IfItExists policy) : finalName(name), ifItExists(policy) {
+    if (finalName.Existed() && ifItExists == IfItExists::Refuse) {
+        FailAsItExists();
     }
-    if (Files::exists(status) && ifItExists == IfItExists::Refuse) {
-        throw ToolFailure(ExitCode::File, name + " exists already", "name a file that does not exist yet");
-    }
-    Files::path written = target;
-    if (!Files::exists(status) || Files::is_regular_file(status)) {
-        // Through a link: the link stays, what it points to is replaced.
-        if (const Files::path real = Files::canonical(target, error); !error) {
-            target = real;
-        }
-        partial = target;
+    Files::path written = name;
+    if (finalName.CanBeReplaced()) {
+        partial = finalName.Path();
         partial += ".part" + std::to_string(std::random_device{}());
         written = partial;
     }
@@ -42,7 +32,7 @@ AtomicFile::AtomicFile(const std::string& name, IfItExists policy)
     stream.open(written, std::ios::binary | std::ios::trunc);
     if (!stream) {
         partial.clear();
-        Fail(ReasonOfLastFailure());
+        finalName.Fail(ReasonOfLastFailure());
     }
 }
 
@@ -54,49 +44,29 @@ AtomicFile::~AtomicFile() {
     }
 }
 
-void AtomicFile::Flush() {
+void AtomicFile::Commit() {
     if (stream) {
         errno = 0;
-        stream.flush();
+        stream.close();
     }
     if (!stream) {  // it may have failed before: then the reason is still that of the write
-        Fail(ReasonOfLastFailure());
-    }
-}
-
-void AtomicFile::Commit() {
-    Flush();
-    errno = 0;
-    stream.close();
-    if (!stream) {
-        Fail(ReasonOfLastFailure());
+        finalName.Fail(ReasonOfLastFailure());
     }
     if (!partial.empty()) {
         errno = 0;
         if (!SyncToDisk(partial.string())) {
-            Fail(ReasonOfLastFailure());
+            finalName.Fail(ReasonOfLastFailure());
         }
-        std::error_code error;
-        if (ifItExists == IfItExists::Refuse && Files::exists(target, error)) {
-            throw ToolFailure(ExitCode::File, shownName + " exists already",
-                              "name a file that does not exist yet");
+        if (!finalName.Give(partial, ifItExists)) {
+            FailAsItExists();
         }
-        if (Files::exists(target, error)) {
-            Files::permissions(partial, Files::status(target, error).permissions(), error);
-        }
-        Files::rename(partial, target, error);
-        if (error) {
-            Fail(error.message());
-        }
-        // So that the name is on the disk as well; a system that cannot do that to a folder does without.
-        SyncToDisk(target.has_parent_path() ? target.parent_path().string() : ".");
     }
     committed = true;
 }
 
-void AtomicFile::Fail(const std::string& what) const {
-    throw ToolFailure(ExitCode::File, "cannot write " + shownName + ": " + what,
-                      "check the folder, its permissions and the free space");
+void AtomicFile::FailAsItExists() const {
+    throw ToolFailure(ExitCode::File, finalName.Shown() + " exists already",
+                      "name a file that does not exist yet");
 }
 
 void WriteFileAtomically(const std::string& name, std::span<const std::uint8_t> content,

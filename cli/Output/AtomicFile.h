@@ -6,6 +6,8 @@
 #include <span>
 #include <string>
 
+#include "Output/FinalName.h"
+
 namespace Varnholt::Cli {
 
 /// A file that takes its name only when it is complete: until `Commit` the content is in a file beside it,
@@ -15,7 +17,7 @@ namespace Varnholt::Cli {
 /// Failures are `ToolFailure` with `ExitCode::File`.
 class AtomicFile final {
   public:
-    enum class IfItExists { Replace, Refuse };
+    using IfItExists = FinalName::IfItExists;
 
     explicit AtomicFile(const std::string& name, IfItExists policy = IfItExists::Replace);
     ~AtomicFile();
@@ -23,17 +25,14 @@ class AtomicFile final {
     AtomicFile& operator=(const AtomicFile&) = delete;
 
     std::ostream& Stream() { return stream; }
-    /// What has been written is with the operating system; throws where it does not take it.
-    void Flush();
     /// Returns when the content is on the disk under its name.
     void Commit();
 
   private:
-    [[noreturn]] void Fail(const std::string& what) const;
+    [[noreturn]] void FailAsItExists() const;
 
-    const std::string shownName;
+    const FinalName finalName;
     const IfItExists ifItExists;
-    std::filesystem::path target;
     std::filesystem::path partial;  ///< empty: written directly
     std::ofstream stream;
     bool committed = false;

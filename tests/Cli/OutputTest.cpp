@@ -1,8 +1,16 @@
 #include <gtest/gtest.h>
+#if !defined(_WIN32)
+#include <fcntl.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <unistd.h>
+#endif
 
 #include <cmath>
+#include <csignal>
 #include <limits>
 #include <sstream>
+#include <thread>
 
 #include "Failure.h"
 #include "Output/AtomicFile.h"
@@ -10,6 +18,7 @@
 #include "Output/LiveBlock.h"
 #include "Output/Plot.h"
 #include "Output/Progress.h"
+#include "Output/RecordingFile.h"
 #include "Output/Table.h"
 #include "Support/ExpectThrow.h"
 #include "ToolFixture.h"
@@ -212,7 +221,179 @@ TEST_F(AtomicFileTest, NamesTheFileThatCannotBeWritten) {
     }
 }
 
+class RecordingFileTest : public testing::Test {
+  protected:
+    using Form = RecordOutput::Form;
+    using Action = RecordOutput::Remains (*)(RecordOutput& file);
+
+    std::string Content(const std::string& name) {
+        const auto bytes = ReadFile(folder.Path(name));
+        return {bytes.begin(), bytes.end()};
+    }
+
+    TestFolder folder;
+    Interruption none;
+};
+
+TEST_F(RecordingFileTest, Ends) {
+    const Action complete = [](RecordOutput& file) {
+        file.Complete();
+        return RecordOutput::Remains{};
+    };
+    const Action keep = [](RecordOutput& file) { return file.KeepWholeRecords(); };
+    const Action discard = [](RecordOutput& file) {
+        file.Discard();
+        return RecordOutput::Remains{};
+    };
+    const Action nothing = [](RecordOutput&) { return RecordOutput::Remains{}; };
+    struct Case {
+        const char* name;
+        bool existed;
+        std::uint64_t records;
+        Action end;
+        std::vector<std::string> files;  ///< name and content
+        RecordOutput::Remains remains;
+    };
+    for (const Case& row : {
+             Case{"complete", false, 2, complete, {"f=head,1,2,"}, {}},
+             Case{"complete, over another", true, 2, complete, {"f=head,1,2,"}, {}},
+             Case{"complete without records", true, 0, complete, {"f=head,"}, {}},
+             Case{"early", false, 2, keep, {"f=head,1,2,"}, {"f", ""}},
+             Case{"early, another there", true, 2, keep, {"f=old", "f.part=head,1,2,"}, {"f.part", "f"}},
+             Case{"early without records", true, 0, keep, {"f=old"}, {}},
+             Case{"discarded", true, 2, discard, {"f=old"}, {}},
+             Case{"discarded, nothing there", false, 2, discard, {}, {}},
+             Case{"left alone", false, 1, nothing, {"f=head,1,"}, {}},
+             Case{"left alone, another there", true, 1, nothing, {"f=old", "f.part=head,1,"}, {}},
+         }) {
+        SCOPED_TRACE(row.name);
+        for (const std::string& name : folder.Files()) {
+            std::filesystem::remove(folder.Path(name));
+        }
+        if (row.existed) {
+            WriteFile(folder.Path("f"), {'o', 'l', 'd'});
+            std::filesystem::permissions(folder.Path("f"), std::filesystem::perms::owner_all);
+        }
+        {
+            RecordingFile file(folder.Path("f"), none);
+            EXPECT_THROW(RecordingFile(folder.Path("f"), none), ToolFailure) << "two at once";
+            file.Append(std::string("head,"), 0);
+            for (std::uint64_t i = 1; i <= row.records; ++i) {
+                file.Append(std::to_string(i) + ',', 1);
+            }
+            const auto remains = row.end(file);
+            const auto path = [this](const std::string& name) {
+                return name.empty() ? name : folder.Path(name);
+            };
+            EXPECT_EQ(remains.file, path(row.remains.file));
+            EXPECT_EQ(remains.earlier, path(row.remains.earlier));
+        }
+        std::vector<std::string> found;
+        for (const std::string& name : folder.Files()) {
+            found.push_back(name + '=' + Content(name));
+        }
+        EXPECT_EQ(found, row.files);
+        if (row.existed) {
+            EXPECT_EQ(
+                std::filesystem::status(folder.Path("f")).permissions() & std::filesystem::perms::owner_all,
+                std::filesystem::perms::owner_all);
+        }
+    }
+}
+
+TEST_F(RecordingFileTest, WhatAKilledRunLeftIsNotTouched) {
+    WriteFile(folder.Path("f.part"), {'k', 'e', 'p', 't'});
+    ExpectThrow<ToolFailure>(
+        folder.Path("f.part") + " exists: another run writes it, or one that was killed left it",
+        [this] { RecordingFile(folder.Path("f"), none); });
+    EXPECT_EQ(Content("f.part"), "kept");
+}
+
+TEST_F(RecordingFileTest, WhoTakesTheNameMeanwhileKeepsIt) {
+    RecordingFile file(folder.Path("f"), none);
+    file.Append(std::string("1"), 1);
+    WriteFile(folder.Path("f"), {'n', 'e', 'w'});
+    EXPECT_EQ(file.KeepWholeRecords().file, folder.Path("f.part"));
+    EXPECT_EQ(Content("f"), "new");
+    EXPECT_EQ(Content("f.part"), "1");
+}
+
 #if !defined(_WIN32)
+/// Files of this process cannot grow beyond a size, as on a full disk.
+class FullDisk final {
+  public:
+    explicit FullDisk(rlim_t size) {
+        ::getrlimit(RLIMIT_FSIZE, &limitBefore);
+        handlerBefore = ::signal(SIGXFSZ, SIG_IGN);
+        const rlimit limit{size, limitBefore.rlim_max};
+        ::setrlimit(RLIMIT_FSIZE, &limit);
+    }
+    ~FullDisk() {
+        ::setrlimit(RLIMIT_FSIZE, &limitBefore);
+        ::signal(SIGXFSZ, handlerBefore);
+    }
+    FullDisk(const FullDisk&) = delete;
+    FullDisk& operator=(const FullDisk&) = delete;
+
+  private:
+    rlimit limitBefore{};
+    void (*handlerBefore)(int) = nullptr;
+};
+
+TEST_F(RecordingFileTest, AFullDiskLeavesTheWholeRecords) {
+    struct Case {
+        std::string block;
+        std::uint64_t records;
+        Form form;
+        std::uint64_t kept;
+        std::string content;
+    };
+    for (const Case& row : {
+             Case{"11\n2222\n3\n", 3, Form::Lines, 2, "head\n11\n2222\n"},
+             Case{"11\n222222222222222\n", 2, Form::Lines, 1, "head\n11\n"},
+             Case{"aaaabbbbccccdddd", 4, Form::EqualLength, 2, "head\naaaabbbb"},
+             Case{"one that is not there as a whole", 1, Form::EqualLength, 0, ""},
+         }) {
+        SCOPED_TRACE(row.block);
+        RecordingFile file(folder.Path("f"), none);
+        {
+            const FullDisk full(14);
+            file.Append(std::string("head\n"), 0);
+            ExpectThrow<ToolFailure>("cannot write " + folder.Path("f") + ": File too large",
+                                     [&] { file.Append(row.block, row.records, row.form); });
+        }
+        EXPECT_EQ(file.Records(), row.kept);
+        EXPECT_EQ(file.KeepWholeRecords().file, row.kept > 0 ? folder.Path("f") : "");
+        EXPECT_EQ(row.kept > 0 ? Content("f") : "", row.content);
+        EXPECT_EQ(std::filesystem::remove(folder.Path("f")), row.kept > 0);
+        EXPECT_EQ(folder.Files().size(), 0u);
+    }
+}
+
+/// Whatever is waited for: a reader of a FIFO at all, and one that reads.
+TEST_F(RecordingFileTest, AnInterruptionEndsEveryWait) {
+    const std::string fifo = folder.Path("fifo");
+    ASSERT_EQ(::mkfifo(fifo.c_str(), 0600), 0);
+    {
+        Interruption interruption;
+        std::thread user([&interruption] { interruption.Request(); });
+        ExpectThrow<ToolFailure>("interrupted", [&] { RecordingFile(fifo, interruption); });
+        user.join();
+    }
+    const int idleReader = ::open(fifo.c_str(), O_RDONLY | O_NONBLOCK);
+    ASSERT_GE(idleReader, 0);
+    Interruption interruption;
+    RecordingFile file(fifo, interruption);
+    std::thread user([&interruption] { interruption.Request(); });
+    const std::string records(1'000'000, 'x');
+    ExpectThrow<ToolFailure>("interrupted", [&] { file.Append(records, records.size() / 100); });
+    user.join();
+    EXPECT_EQ(file.Records(), static_cast<std::uint64_t>(::fcntl(idleReader, F_GETPIPE_SZ)) / 100);
+    EXPECT_EQ(file.KeepWholeRecords().file, fifo);
+    ::close(idleReader);
+    EXPECT_TRUE(std::filesystem::is_fifo(fifo));
+}
+
 TEST_F(AtomicFileTest, ALinkStaysAndADeviceIsWrittenTo) {
     WriteFile(path, before);
     std::filesystem::create_symlink(path, folder.Path("link"));

@@ -1,0 +1,67 @@
+#include "Output/DescriptorStream.h"
+
+#include <cerrno>
+#include <cstring>
+
+namespace Varnholt::Cli {
+
+DescriptorStream::DescriptorStream(OutputDescriptor target, const Interruption& userInterruption, Lost lost)
+    : std::ostream(nullptr), buffer(std::move(target), userInterruption, lost) {
+    rdbuf(&buffer);
+}
+
+DescriptorStream::Buffer::Buffer(OutputDescriptor openTarget, const Interruption& userInterruption,
+                                 Lost whatIsLost)
+    : target(std::move(openTarget)), interruption(userInterruption), lost(whatIsLost) {
+    setp(room.data(), room.data() + room.size());
+}
+
+DescriptorStream::Buffer::~Buffer() {
+    Buffer::sync();
+}
+
+/// How many of them count as written.
+std::size_t DescriptorStream::Buffer::Write(std::span<const char> bytes) {
+    const OutputDescriptor::Outcome outcome = target.Write(bytes, interruption);
+    if (!outcome.error || lost == Lost::IsIgnored) {
+        return bytes.size();
+    }
+    errno = outcome.error.value();
+    return outcome.accepted;
+}
+
+int DescriptorStream::Buffer::sync() {
+    const auto held = static_cast<std::size_t>(pptr() - pbase());
+    const std::size_t written = Write({pbase(), held});
+    // What is left stays in front, so that nothing is written twice.
+    std::memmove(pbase(), pbase() + written, held - written);
+    setp(room.data(), room.data() + room.size());
+    pbump(static_cast<int>(held - written));
+    return written == held ? 0 : -1;
+}
+
+DescriptorStream::Buffer::int_type DescriptorStream::Buffer::overflow(int_type character) {
+    if (sync() != 0) {
+        return traits_type::eof();
+    }
+    if (!traits_type::eq_int_type(character, traits_type::eof())) {
+        *pptr() = traits_type::to_char_type(character);
+        pbump(1);
+    }
+    return traits_type::not_eof(character);
+}
+
+/// What is larger than the buffer goes past it; the answer is then exact.
+std::streamsize DescriptorStream::Buffer::xsputn(const char* text, std::streamsize size) {
+    if (size <= epptr() - pptr()) {
+        std::memcpy(pptr(), text, static_cast<std::size_t>(size));
+        pbump(static_cast<int>(size));
+        return size;
+    }
+    if (sync() != 0) {
+        return 0;
+    }
+    return static_cast<std::streamsize>(Write({text, static_cast<std::size_t>(size)}));
+}
+
+}  // namespace Varnholt::Cli

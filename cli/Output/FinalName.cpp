@@ -1,0 +1,71 @@
+#include "Output/FinalName.h"
+
+#include <system_error>
+
+#include "Failure.h"
+#include "Terminal.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+namespace Files = std::filesystem;
+
+/// Where the file system has no second names for a file, what comes between the question and the change
+/// loses.
+bool RenameIfFree(const Files::path& partial, const Files::path& target, std::error_code& error) {
+    Files::create_hard_link(partial, target, error);
+    if (!error) {
+        Files::remove(partial, error);
+        return true;
+    }
+    if (error == std::errc::file_exists || Files::exists(target, error)) {
+        error.clear();
+        return false;
+    }
+    Files::rename(partial, target, error);
+    return true;
+}
+
+}  // namespace
+
+FinalName::FinalName(const std::string& name) : shownName(name), target(name) {
+    std::error_code error;
+    const Files::file_status status = Files::status(target, error);
+    existed = Files::exists(status);
+    isOrdinary = !existed || Files::is_regular_file(status);
+    if (Files::is_directory(status)) {
+        throw ToolFailure(ExitCode::File, name + " is a directory", "name a file");
+    }
+    if (isOrdinary) {
+        if (const Files::path real = Files::canonical(target, error); !error) {
+            target = real;
+        }
+    }
+}
+
+bool FinalName::Give(const Files::path& partial, IfItExists policy) const {
+    std::error_code error;
+    if (policy == IfItExists::Refuse) {
+        if (!RenameIfFree(partial, target, error)) {
+            return false;
+        }
+    } else {
+        if (Files::exists(target, error)) {
+            Files::permissions(partial, Files::status(target, error).permissions(), error);
+        }
+        Files::rename(partial, target, error);
+    }
+    if (error) {
+        Fail(error.message());
+    }
+    // So that the name is on the disk as well; a system that cannot do that to a folder does without.
+    SyncToDisk(target.has_parent_path() ? target.parent_path().string() : ".");
+    return true;
+}
+
+void FinalName::Fail(const std::string& what) const {
+    throw ToolFailure(ExitCode::File, "cannot write " + shownName + ": " + what,
+                      "check the folder, its permissions and the free space");
+}
+
+}  // namespace Varnholt::Cli

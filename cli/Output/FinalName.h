@@ -1,0 +1,39 @@
+#pragma once
+
+#include <filesystem>
+#include <string>
+
+namespace Varnholt::Cli {
+
+/// The name that a file is to have once it is complete: what may have that name now, and how a file that was
+/// written beside it takes its place. Failures are `ToolFailure` with `ExitCode::File`.
+class FinalName final {
+  public:
+    enum class IfItExists { Replace, Refuse };
+
+    /// A folder is refused.
+    explicit FinalName(const std::string& name);
+
+    const std::string& Shown() const { return shownName; }
+    /// Through links: a link stays, what it points to is replaced.
+    const std::filesystem::path& Path() const { return target; }
+    /// False for what can only be written to directly: a device, a pipe.
+    bool CanBeReplaced() const { return isOrdinary; }
+    /// Whether something had the name when the object was made.
+    bool Existed() const { return existed; }
+
+    /// `partial`, a closed file in the same folder whose content is on the disk, gets the name, and the
+    /// permissions of what had it. False, with nothing changed, where that is refused because something has
+    /// the name already.
+    bool Give(const std::filesystem::path& partial, IfItExists policy) const;
+
+    [[noreturn]] void Fail(const std::string& what) const;
+
+  private:
+    const std::string shownName;
+    std::filesystem::path target;
+    bool existed;
+    bool isOrdinary;
+};
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,39 @@
+#pragma once
+
+#include <filesystem>
+#include <optional>
+
+#include "Output/FinalName.h"
+#include "Output/OutputDescriptor.h"
+#include "Output/RecordOutput.h"
+
+namespace Varnholt::Cli {
+
+/// Records in a file that grows as FILE.part and is FILE when it is complete. An early end cuts it to whole
+/// records; it then becomes FILE only where there was none. What is no ordinary file is written to directly.
+///
+/// A FILE.part that is there already belongs to another run, or is what a killed one left: it is refused.
+class RecordingFile final : public RecordOutput {
+  public:
+    /// `userInterruption` outlives the object.
+    RecordingFile(const std::string& name, const Interruption& userInterruption);
+    /// Without a word on what it is to become, it ends early and keeps what there is.
+    ~RecordingFile() override;
+
+    void Complete() override;
+    Remains KeepWholeRecords() override;
+    void Discard() override;
+
+  private:
+    Taken Take(std::span<const char> block) override;
+    [[noreturn]] void Fail(std::error_code error) const override;
+    OutputDescriptor Open();
+
+    const FinalName finalName;
+    const Interruption& interruption;
+    const std::filesystem::path partial;  ///< empty: written directly
+    OutputDescriptor descriptor;
+    bool isOpen = true;
+};
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,32 @@
+#include "Output/StreamOutput.h"
+
+#include <cerrno>
+#include <ostream>
+
+#include "Failure.h"
+
+namespace Varnholt::Cli {
+
+/// Past the stream to its buffer, which answers how much it took.
+RecordOutput::Taken StreamOutput::Take(std::span<const char> block) {
+    const auto failed = [](std::size_t taken) {
+        return Taken{taken, {errno != 0 ? errno : EIO, std::generic_category()}};
+    };
+    errno = 0;
+    if (!stream.flush()) {
+        return failed(0);
+    }
+    const auto taken = static_cast<std::size_t>(
+        stream.rdbuf()->sputn(block.data(), static_cast<std::streamsize>(block.size())));
+    if (taken < block.size()) {
+        stream.setstate(std::ios::badbit);
+        return failed(taken);
+    }
+    return stream.flush() ? Taken{taken, {}} : failed(0);
+}
+
+void StreamOutput::Fail(std::error_code error) const {
+    throw ToolFailure(ExitCode::File, "the output cannot be written: " + error.message());
+}
+
+}  // namespace Varnholt::Cli
