@@ -53,6 +53,15 @@ std::vector<std::uint16_t> ParseParameters(const std::string& text) {
     return parameters.back() > 0xFF ? std::vector<std::uint16_t>() : parameters;
 }
 
+/// Those that are sent as they are.
+MeasurementFacts ChosenParameters(const MeasurementOptions& options) {
+    if (options.parameters.empty()) {
+        return {Fixed::P1, Fixed::P2, Fixed::P3, Fixed::P4};
+    }
+    const std::vector<std::uint16_t> p = ParseParameters(options.parameters);
+    return {p.at(0), p.at(1), p.at(2), static_cast<std::uint8_t>(p.at(3))};
+}
+
 std::string CheckParameters(const std::string& text) {
     return ParseParameters(text).empty()
                ? "'" + text + "': three numbers up to 65535 and one up to 255, with commas"
@@ -84,13 +93,20 @@ void PrepareMeasurement(Session& session, Instrument& instrument, const Measurem
     }
     if (options.integrationTime > 0) {
         SetIntegrationTime(instrument, options.integrationTime);
-    } else if (!options.parameters.empty()) {
-        const std::vector<std::uint16_t> p = ParseParameters(options.parameters);
-        instrument.Commands().SetMeasureParameters(p.at(0), p.at(1), p.at(2),
-                                                   static_cast<std::uint8_t>(p.at(3)));
     } else {
-        instrument.Commands().SetMeasureParameters(Fixed::P1, Fixed::P2, Fixed::P3, Fixed::P4);
+        const MeasurementFacts sent = ChosenParameters(options);
+        instrument.Commands().SetMeasureParameters(sent.p1, sent.p2, sent.p3, sent.p4);
     }
+}
+
+MeasurementFacts FactsOf(Instrument& instrument, const MeasurementOptions& options) {
+    MeasurementFacts facts = ChosenParameters(options);
+    if (options.integrationTime > 0) {
+        std::uint8_t p5 = 0;
+        instrument.Commands().GetMeasureParameters(facts.p1, facts.p2, facts.p3, facts.p4, p5);
+    }
+    facts.integrationTime = facts.p1 * RamAccess(instrument).TimeUnit();
+    return facts;
 }
 
 std::vector<std::int32_t> ValuesOf(std::span<const std::uint8_t> record) {

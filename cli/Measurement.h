@@ -22,6 +22,16 @@ void AddMeasurementOptions(CommandSpec command, MeasurementOptions& options);
 /// Gives the instrument the time that it needs after its reset and sets its measurement parameters.
 void PrepareMeasurement(Session& session, Instrument& instrument, const MeasurementOptions& options);
 
+/// What a measurement is taken with.
+struct MeasurementFacts {
+    std::uint16_t p1 = 0, p2 = 0, p3 = 0;
+    std::uint8_t p4 = 0;
+    double integrationTime = 0;  ///< seconds: p1 in time units of the instrument's measurement mode
+};
+/// Of a measurement that is prepared. Asks the instrument for its mode, and with an integration time for the
+/// parameters that were made of it.
+MeasurementFacts FactsOf(Instrument& instrument, const MeasurementOptions& options);
+
 /// The signed values of a record: pairs of bytes, most significant first, those above 0xF800 negative.
 std::vector<std::int32_t> ValuesOf(std::span<const std::uint8_t> record);
 

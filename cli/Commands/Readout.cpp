@@ -1,19 +1,21 @@
 #include "Interface/Readout.h"
 
 #include <fmt/format.h>
-#include <fmt/ostream.h>
 
 #include <algorithm>
 #include <array>
 #include <numeric>
 #include <optional>
+#include <sstream>
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
+#include "Commands/MeasurementOutput.h"
 #include "ElapsedTime.h"
 #include "Measurement.h"
-#include "Output/AtomicFile.h"
 #include "Output/Json.h"
+#include "Output/LiveBlock.h"
+#include "Output/WallTimeText.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -35,6 +37,7 @@ using RawReadout = std::array<std::uint8_t, Protocol::ReadoutBytes>;
 struct Readout {
     std::uint32_t number;  ///< from 1
     double seconds;        ///< since the first
+    Platform::WallTime time;
     RawReadout bytes;
 
     Values GetValues() const { return Interface::ReadoutFromBytes(bytes); }
@@ -47,101 +50,96 @@ std::string Summary(const Values& values) {
                        high - values.begin(), mean);
 }
 
-void PrintTable(std::ostream& out, const Values& values) {
+std::string TableOf(const Values& values) {
+    std::string text;
     for (std::size_t row = 0; row < values.size(); row += ValuesInARow) {
-        fmt::print(out, "{:>3}:", row);
+        text += fmt::format("{:>3}:", row);
         for (std::size_t i = row; i < row + ValuesInARow; ++i) {
-            fmt::print(out, " {:>6}", values[i]);
+            text += fmt::format(" {:>6}", values[i]);
         }
-        out << '\n';
+        text += '\n';
     }
+    return text;
 }
 
-/// Writes readouts in the form that the user asked for.
-class Writer final {
+constexpr const char* Noun = "readout";
+
+/// Puts readouts into the form that the user asked for.
+class Formatter final {
   public:
-    Writer(Session& usedSession, const Options& chosen, std::string identifier)
-        : session(usedSession), options(chosen), instrument(std::move(identifier)) {
-        if (!options.output.empty()) {
-            file.emplace(options.output);
-        } else if (options.raw) {
-            if (session.OutFacts().isTerminal) {
-                throw ToolFailure(ExitCode::Usage, "raw bytes are no use on a terminal",
-                                  "write them to a file: --output FILE");
-            }
-            SetStandardOutputBinary();
+    Formatter(Session& usedSession, const Options& chosen, std::string identifier)
+        : session(usedSession),
+          options(chosen),
+          instrument(std::move(identifier)),
+          isDrawnOver(!GoesToFile(options.output) && session.OutFacts().isTerminal),
+          block(session.OutFacts()) {}
+
+    void SetFacts(const MeasurementFacts& measurement) { facts = measurement; }
+
+    /// What stands before the first readout.
+    std::string Head() const {
+        if (!options.csv) {
+            return {};
         }
+        std::array<int, Protocol::ReadoutValues> indices{};
+        std::iota(indices.begin(), indices.end(), 0);
+        return fmt::format("readout,seconds,{},time,p1,p2,p3,p4,integrationTime\n", fmt::join(indices, ","));
     }
 
-    void Write(const Readout& readout) {
-        std::ostream& out = file ? file->Stream() : session.Out();
+    std::string TextOf(const Readout& readout) {
         const Values values = readout.GetValues();
         if (options.raw) {
-            out.write(reinterpret_cast<const char*>(readout.bytes.data()), Protocol::ReadoutBytes);
-        } else if (options.json) {
-            PrintJson(out, {{"identifier", instrument},
-                            {"readout", readout.number},
-                            {"seconds", readout.seconds},
-                            {"values", values}});
-        } else if (options.csv) {
-            if (readout.number == 1) {
-                std::array<int, Protocol::ReadoutValues> indices{};
-                std::iota(indices.begin(), indices.end(), 0);
-                fmt::print(out, "readout,seconds,{}\n", fmt::join(indices, ","));
-            }
-            fmt::print(out, "{},{:.3f},{}\n", readout.number, readout.seconds, fmt::join(values, ","));
-        } else {
-            WriteForReaders(out, readout.number, values);
+            return {readout.bytes.begin(), readout.bytes.end()};
         }
-        file ? file->Flush() : session.FlushOut();
-    }
-
-    void Finish() {
-        if (file) {
-            file->Commit();
+        if (options.json) {
+            std::ostringstream line;
+            PrintJson(line, {{"identifier", instrument},
+                             {"readout", readout.number},
+                             {"seconds", readout.seconds},
+                             {"values", values},
+                             {"time", WallTimeText(readout.time)},
+                             {"parameters", {facts.p1, facts.p2, facts.p3, facts.p4}},
+                             {"integrationTime", facts.integrationTime}});
+            return line.str();
         }
-    }
-
-    /// While a failure is being handled that ends the readouts after so many: those go into the file, and the
-    /// failure goes on as one that says so.
-    void FinishEarly(std::uint32_t taken) {
-        if (!file || taken == 0) {
-            return;
+        if (options.csv) {
+            return fmt::format("{},{:.3f},{},{},{},{},{},{},{}\n", readout.number, readout.seconds,
+                               fmt::join(values, ","), WallTimeText(readout.time), facts.p1, facts.p2,
+                               facts.p3, facts.p4, facts.integrationTime);
         }
-        const FailureReport failure = session.Explain(std::current_exception());
-        file->Commit();
-        throw ToolFailure(failure.code,
-                          fmt::format("{}; {} written to {}", failure.message,
-                                      taken == 1 ? "1 readout was" : fmt::format("{} readouts were", taken),
-                                      options.output),
-                          failure.advice);
+        const std::string summary =
+            (options.repeat != 1 ? fmt::format("readout {}: ", readout.number) : "") + Summary(values);
+        if (!options.plot) {
+            return (readout.number > 1 ? "\n" : "") + TableOf(values) + summary + '\n';
+        }
+        return PlotOf(values, summary);
     }
 
   private:
-    void WriteForReaders(std::ostream& out, std::uint32_t number, const Values& values) {
-        std::string head;
-        if (options.repeat != 1) {
-            head = fmt::format("readout {}: ", number);
+    std::string PlotOf(const Values& values, const std::string& summary) {
+        PlotStyle style = session.StyleOfPlots();
+        style.braille = style.braille && !options.ascii;
+        std::string below = summary + '\n';
+        if (isDrawnOver) {
+            // All of it is on the screen, or it could not be drawn over.
+            const TerminalSize size = session.OutFacts().size();
+            below = Wrapped(summary, static_cast<std::size_t>(std::max(size.columns - 1, 1)));
+            const int linesOfAxis = PlotLines(style) - style.height;
+            const auto linesBelow = static_cast<int>(std::count(below.begin(), below.end(), '\n'));
+            style.height = std::min(style.height, size.rows - linesBelow - linesOfAxis - 1);
         }
-        if (!options.plot) {
-            out << (number > 1 ? "\n" : "");
-            PrintTable(out, values);
-        } else {
-            PlotStyle style = session.StyleOfPlots();
-            style.braille = style.braille && !options.ascii;
-            if (number > 1 && !file && session.OutFacts().isTerminal) {
-                fmt::print(out, "\x1b[{}A\x1b[J", PlotLines(style) + 1);  // over the one before
-            }
-            const std::vector<double> points(values.begin(), values.end());
-            PrintPlot(out, points, style);
-        }
-        out << head << Summary(values) << '\n';
+        std::ostringstream drawn;
+        const std::vector<double> points(values.begin(), values.end());
+        PrintPlot(drawn, points, style);
+        return isDrawnOver ? block.Over(drawn.str() + below) : drawn.str() + below;
     }
 
     Session& session;
     const Options& options;
     const std::string instrument;
-    std::optional<AtomicFile> file;
+    const bool isDrawnOver;
+    LiveBlock block;
+    MeasurementFacts facts;
 };
 
 /// Waits until it is due, so many milliseconds after the first, and takes it.
@@ -151,46 +149,70 @@ Readout Take(Session& session, Instrument& instrument, std::uint32_t number, std
     if (!session.UserInterruption().Sleep(static_cast<std::uint32_t>(due > elapsed ? due - elapsed : 0))) {
         session.UserInterruption().ThrowIfRequested();
     }
-    Readout readout{number, static_cast<double>(time.Milliseconds()) / 1000, {}};
+    Readout readout{number, static_cast<double>(time.Milliseconds()) / 1000, Platform::WallClockNow(), {}};
     instrument.Commands().MeasureRequest(readout.bytes.data(), Protocol::ReadoutBytes,
                                          Interface::FixedReadout::Timeout);
     return readout;
 }
 
-void TakeAll(Session& session, const Options& options) {
-    Instrument instrument(session, options.instrument);
-    Writer writer(session, options, instrument.Identifier());
-    PrepareMeasurement(session, instrument, options.measurement);
+/// Takes readouts until there are enough, or until the user ends what has no other end.
+void TakeSeries(Session& session, Instrument& instrument, const Options& options, Formatter& formatter,
+                RecordOutput& output, ElapsedTime& time) {
+    Progress progress = session.MakeProgress("taking", options.repeat, std::string(Noun) + "s");
     const auto interval = static_cast<std::uint64_t>(options.interval * 1000);
-    ElapsedTime time;
     for (std::uint32_t taken = 0; options.repeat == 0 || taken < options.repeat; ++taken) {
         Readout readout{};
         try {
             // The interval is from start to start, so that it does not drift.
             readout = Take(session, instrument, taken + 1, taken * interval, time);
         } catch (...) {
-            writer.FinishEarly(taken);
+            if (options.repeat == 0 && taken > 0 && session.UserInterruption().IsRequested()) {
+                return;
+            }
             throw;
         }
-        writer.Write(readout);
+        if (taken == 0) {
+            output.Append(formatter.Head(), 0);
+        }
+        output.Append(formatter.TextOf(readout), 1);
+        if (GoesToFile(options.output)) {
+            progress.Update(taken + 1);
+        }
     }
-    writer.Finish();
+}
+
+void TakeInto(RecordOutput& output, Session& session, const Options& options) {
+    Instrument instrument(session, options.instrument);
+    Formatter formatter(session, options, instrument.Identifier());
+    PrepareMeasurement(session, instrument, options.measurement);
+    if (options.json || options.csv) {
+        formatter.SetFacts(FactsOf(instrument, options.measurement));
+    }
+    ElapsedTime time;
+    TakeSeries(session, instrument, options, formatter, output, time);
+    output.Complete();
+    if (GoesToFile(options.output)) {
+        session.Note(fmt::format("{} in {:.3f} s, written to {}", CountText(output.Records(), Noun),
+                                 static_cast<double>(time.Milliseconds()) / 1000, options.output));
+    }
 }
 
 void TakeReadouts(Session& session, const Options& options) {
     if (int{options.json} + int{options.csv} + int{options.plot} + int{options.raw} > 1) {
         throw ToolFailure(ExitCode::Usage, "--json, --csv, --plot and --raw exclude each other");
     }
+    const auto output = MakeRecordOutput(session, options.output, options.raw);
     try {
-        TakeAll(session, options);
+        TakeInto(*output, session, options);
     } catch (...) {
-        const FailureReport end = session.Explain(std::current_exception());
-        if (options.repeat != 0 || end.code != ExitCode::Interrupted) {
-            throw;
+        const FailureReport failure = EndEarly(session, *output, Noun, false).failure;
+        // The user's wish is the only end that it has.
+        if (options.repeat != 0 || failure.code != ExitCode::Interrupted || output->Records() > 0) {
+            throw ToolFailure(failure.code, failure.message, failure.advice);
         }
-        // The only end that it has. Whoever wants a file is told what is in it.
-        if (!options.output.empty()) {
-            session.Note(end.message);
+        // Whoever wants a file is told that there is none.
+        if (GoesToFile(options.output)) {
+            session.Note(failure.message);
         }
     }
 }
@@ -211,7 +233,9 @@ void AddReadout(CommandSpec app, Session& session) {
     command.AddFlag("--raw", options->raw, "the 256 bytes of each readout as the instrument sent them")
         .Group(heading);
     command.AddFlag("--ascii", options->ascii, "draw without Braille characters").Group(heading);
-    command.Add("-o,--output", options->output, "write to a file, which is replaced when complete")
+    command
+        .Add("-o,--output", options->output,
+             "write to a file, which is replaced when complete; -: to standard output")
         .Type("FILE")
         .Group(heading);
     AddMeasurementOptions(command, options->measurement);

@@ -101,6 +101,14 @@ void RamAccess::Store(Properties& set) {
     ram.Store(set);
 }
 
+double RamAccess::TimeUnit() {
+    std::uint8_t m1 = 0, m3 = 0;
+    std::uint16_t m2 = 0, m4 = 0, m5 = 0;
+    instrument.Commands().GetMISC(m1, m2, m3, m4, m5);
+    const Mode mode = m2 >= Ids::FirstMisc2WithModes ? CurrentMode(instrument) : OnlyMode;
+    return mode.tickMicroseconds * Microsecond;
+}
+
 /// Goes through the modes as the model does; a mode that does not come when it is called ends the list.
 std::string RamAccess::DescribeModes() {
     std::string text;

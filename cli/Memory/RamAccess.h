@@ -20,6 +20,8 @@ class RamAccess final {
     /// instrument can count is a `ToolFailure` that lists the modes, and a second time that the mode cannot
     /// count another; the instrument is then back in its mode, with its parameters as they were.
     void Store(Properties& set);
+    /// Seconds that the first measurement parameter counts.
+    double TimeUnit();
 
   private:
     std::string DescribeModes();

@@ -67,7 +67,9 @@ TEST_P(InstrumentCommandsTest, ReadoutForms) {
     }
     ASSERT_EQ(tool.Lines().size(), 2u);
     EXPECT_TRUE(tool.Lines()[0].starts_with("readout,seconds,0,1,2,"));
-    EXPECT_EQ(tool.Lines()[1], csv);
+    EXPECT_TRUE(tool.Lines()[0].ends_with(",127,time,p1,p2,p3,p4,integrationTime"));
+    EXPECT_TRUE(tool.Lines()[1].starts_with(csv + ",20"));
+    EXPECT_TRUE(tool.Lines()[1].ends_with(",294,0,1,6,0.019992"));
 
     host.Add("sim");
     Succeed({"readout"});
@@ -81,6 +83,44 @@ TEST_P(InstrumentCommandsTest, ReadoutForms) {
         int value = 0;
         printed >> value;
         EXPECT_EQ(value, values[i]) << i;
+    }
+}
+
+/// What the numbers were taken with, and when.
+TEST_P(InstrumentCommandsTest, ReadoutsSayWhatTheyWereTakenWith) {
+    struct Case {
+        std::uint16_t firmware;
+        Arguments options;
+        nlohmann::json parameters;
+        double time;
+    };
+    InstrumentSettings settings;
+    const std::uint16_t usual = settings.firmware;
+    for (const Case& row : {
+             Case{usual, {}, {294, 0, 1, 6}, 294 * 68e-6},
+             Case{usual, {"--parameters", "7,1,2,3"}, {7, 1, 2, 3}, 7 * 68e-6},
+             Case{usual, {"--integration-time", "0.005"}, {147, 0, 1, 6}, 147 * 34e-6},
+             Case{usual, {}, {294, 0, 1, 6}, 294 * 68e-6},
+             Case{300, {}, {294, 0, 1, 6}, 294 * 68e-6},
+         }) {
+        settings.firmware = row.firmware;
+        host.Add("sim", settings);
+        Arguments arguments = row.options;
+        arguments.insert(arguments.begin(), {"readout", "--json", "--repeat", "2", "--interval", "60"});
+        Succeed(arguments);
+        ASSERT_EQ(tool.Lines().size(), 2u);
+        for (const std::string& line : tool.Lines()) {
+            const auto readout = nlohmann::json::parse(line);
+            EXPECT_EQ(readout["parameters"], row.parameters);
+            EXPECT_NEAR(readout["integrationTime"], row.time, 1e-9);
+            EXPECT_THAT(readout["time"].get<std::string>(),
+                        testing::MatchesRegex("20..-..-..T..:..:..\\.......:.."));
+        }
+        const auto minute = [this](std::size_t line) {
+            const std::string time = nlohmann::json::parse(tool.Lines()[line])["time"];
+            return std::stoi(time.substr(14, 2));
+        };
+        EXPECT_EQ((minute(0) + 1) % 60, minute(1));
     }
 }
 
@@ -120,7 +160,8 @@ TEST_P(InstrumentCommandsTest, ReadoutRepeatsFromStartToStart) {
     }
 }
 
-/// A failure and Ctrl-C alike; before the first readout there is nothing to keep.
+/// A failure and Ctrl-C alike; before the first readout there is nothing to keep. What was there is replaced
+/// by what is complete alone.
 TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
     struct Case {
         const char* repeat;
@@ -130,26 +171,64 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
         const char* text;
         std::ptrdiff_t lines;
     };
-    for (const Case& row : {
-             Case{"5", "bulk-in 2:stall", 90'000'000, ExitCode::InputOutput, "; 2 readouts were written", 3},
-             Case{"5", "", 2'500'000, ExitCode::Interrupted, "interrupted; 2 readouts were written", 3},
-             Case{"0", "", 1'500'000, ExitCode::Success, "interrupted; 1 readout was written", 2},
-             Case{"0", "", 500'000, ExitCode::Success, "interrupted\n", 0},
-             Case{"5", "bulk-in 0:stall", 90'000'000, ExitCode::InputOutput, "", 0},
-         }) {
-        SCOPED_TRACE(row.text);
-        host.Add("sim", Leisurely());
-        SetFaults(row.faults);
-        Cli::Interruption interruption;
-        tool.interruption = &interruption;
-        const auto event = After(row.interruptedAt, [&] { interruption.Request(); });
-        Fail({"readout", "--csv", "--repeat", row.repeat, "--interval", "1", "--output", folder.Path("csv")},
-             row.code, row.text);
-        Platform::ClockScheduler().Forget(event);
-        const auto content = row.lines > 0 ? ReadFile(folder.Path("csv")) : std::vector<std::uint8_t>();
-        EXPECT_EQ(std::count(content.begin(), content.end(), '\n'), row.lines);
-        EXPECT_EQ(std::filesystem::remove(folder.Path("csv")), row.lines > 0);
-        EXPECT_EQ(folder.Files().size(), 0u);
+    constexpr std::uint64_t never = 90'000'000;
+    for (const bool existed : {false, true}) {
+        for (const Case& row : {
+                 Case{"2", "", never, ExitCode::Success, "2 readouts in 1.", 3},
+                 Case{"5", "bulk-in 2:stall", never, ExitCode::InputOutput, "; 2 readouts were written", 3},
+                 Case{"5", "", 2'500'000, ExitCode::Interrupted, "interrupted; 2 readouts were written", 3},
+                 Case{"0", "", 1'500'000, ExitCode::Success, "1 readout in ", 2},
+                 Case{"0", "", 500'000, ExitCode::Success, "interrupted; nothing was recorded", 0},
+                 Case{"5", "bulk-in 0:stall", never, ExitCode::InputOutput, "; nothing was recorded", 0},
+             }) {
+            SCOPED_TRACE(row.text);
+            host.Add("sim", Leisurely());
+            SetFaults(row.faults);
+            if (existed) {
+                WriteFile(folder.Path("csv"), {1});
+            }
+            Cli::Interruption interruption;
+            tool.interruption = &interruption;
+            const auto event = After(row.interruptedAt, [&] { interruption.Request(); });
+            Fail({"readout", "--csv", "--repeat", row.repeat, "--interval", "1", "--output",
+                  folder.Path("csv")},
+                 row.code, row.text);
+            Platform::ClockScheduler().Forget(event);
+            const bool isComplete = row.code == ExitCode::Success && row.lines > 0;
+            const std::string kept = folder.Path(existed && !isComplete ? "csv.part" : "csv");
+            const auto content = row.lines > 0 ? ReadFile(kept) : std::vector<std::uint8_t>();
+            EXPECT_EQ(std::count(content.begin(), content.end(), '\n'), row.lines);
+            EXPECT_EQ(std::filesystem::remove(kept), row.lines > 0);
+            EXPECT_EQ(folder.Files().size(), existed && !isComplete ? 1u : 0u);
+            EXPECT_TRUE(!existed || isComplete ||
+                        ReadFile(folder.Path("csv")) == std::vector<std::uint8_t>{1});
+        }
+    }
+}
+
+TEST_P(InstrumentCommandsTest, ALivePlotFitsOnItsTerminalAndIsDrawnOver) {
+    host.Add("sim", Leisurely());
+    tool.outFacts.isTerminal = true;
+    Succeed({"readout", "--plot", "--repeat", "3"});
+    EXPECT_EQ(tool.Out().find('\x1b'), std::string::npos) << "a terminal that cannot be drawn on";
+    tool.outFacts.movesCursor = true;
+    for (const Cli::TerminalSize size :
+         {Cli::TerminalSize{20, 24}, Cli::TerminalSize{40, 10}, Cli::TerminalSize{132, 50}}) {
+        tool.outFacts.size = [size] { return size; };
+        Succeed({"readout", "--plot", "--repeat", "3"});
+        int lines = 0;
+        int drawnOver = 0;
+        for (const std::string& line : tool.Lines()) {
+            if (line.starts_with("\r\x1b[")) {
+                EXPECT_TRUE(line.starts_with("\r\x1b[" + std::to_string(lines) + "A\x1b[J"));
+                ++drawnOver;
+                lines = 0;
+            } else {
+                EXPECT_LT(line.size(), static_cast<std::size_t>(size.columns));
+            }
+            EXPECT_LT(++lines, size.rows);
+        }
+        EXPECT_EQ(drawnOver, 2);
     }
 }
 

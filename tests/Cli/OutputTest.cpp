@@ -8,6 +8,7 @@
 
 #include <cmath>
 #include <csignal>
+#include <cstdlib>
 #include <limits>
 #include <sstream>
 #include <thread>
@@ -20,6 +21,7 @@
 #include "Output/Progress.h"
 #include "Output/RecordingFile.h"
 #include "Output/Table.h"
+#include "Output/WallTimeText.h"
 #include "Support/ExpectThrow.h"
 #include "ToolFixture.h"
 
@@ -392,6 +394,29 @@ TEST_F(RecordingFileTest, AnInterruptionEndsEveryWait) {
     EXPECT_EQ(file.KeepWholeRecords().file, fifo);
     ::close(idleReader);
     EXPECT_TRUE(std::filesystem::is_fifo(fifo));
+}
+
+/// In zones that a POSIX text describes, so that no data base is needed.
+TEST(WallTimeTextTest, LocalTimeAndItsZone) {
+    const char* const before = std::getenv("TZ");
+    const std::string zoneBefore = before != nullptr ? before : "";
+    struct Case {
+        const char* zone;
+        std::int64_t seconds;
+        const char* text;
+    };
+    for (const Case& row : {
+             Case{"UTC0", 1'795'653'632, "2026-11-26T00:40:32.123+00:00"},
+             Case{"CET-1CEST,M3.5.0,M10.5.0/3", 1'795'653'632, "2026-11-26T01:40:32.123+01:00"},
+             Case{"CET-1CEST,M3.5.0,M10.5.0/3", 1'782'000'000, "2026-06-21T02:00:00.123+02:00"},
+             Case{"NST3:30", 0, "1969-12-31T20:30:00.123-03:30"},
+         }) {
+        ::setenv("TZ", row.zone, 1);
+        ::tzset();
+        EXPECT_EQ(WallTimeText({row.seconds, 123}), row.text);
+    }
+    before != nullptr ? ::setenv("TZ", zoneBefore.c_str(), 1) : ::unsetenv("TZ");
+    ::tzset();
 }
 
 TEST_F(AtomicFileTest, ALinkStaysAndADeviceIsWrittenTo) {
