@@ -1,24 +1,54 @@
 #pragma once
 
+#include <cstdint>
+#include <optional>
+#include <string>
+
 #include "Utilities/Exceptions/Exceptions.h"
 
 namespace Varnholt::DeviceDriver::Generic::Utilities {
 
 using Varnholt::Utilities::Exceptions::RuntimeException;
 
-struct DeviceDriverException : RuntimeException {
+/// How much of its data a transfer moved, where that is not what it was asked for. Bytes.
+struct Shortfall {
+    std::uint32_t moved;
+    std::uint32_t asked;
+};
+
+/// What is known of a failure beside its text is there for those who sort failures: texts are for people.
+class DeviceDriverException : public RuntimeException {
+  public:
     using RuntimeException::RuntimeException;
+    DeviceDriverException(const std::string& message, const std::string& location, std::uint32_t failureCode)
+        : RuntimeException(message, location), code(failureCode) {}
+    DeviceDriverException(const std::string& message, const std::string& location,
+                          const Shortfall& missingData)
+        : RuntimeException(message, location), shortfall(missingData) {}
+
+    /// The operating system's (`Platform::Errors`) or the USBIO driver's (`Protocol::UsbIoDriver::Status`)
+    /// number for the failure; the two ranges do not meet.
+    std::optional<std::uint32_t> Code() const { return code; }
+    /// Of a transfer that succeeded and moved another number of bytes.
+    std::optional<Shortfall> MissingData() const { return shortfall; }
+
+  private:
+    std::optional<std::uint32_t> code;
+    std::optional<Shortfall> shortfall;
 };
 /// Stored or received data that does not fit.
-struct DataException final : DeviceDriverException {
+class DataException final : public DeviceDriverException {
+  public:
     using DeviceDriverException::DeviceDriverException;
 };
 /// A transfer that failed or a device that cannot be opened.
-struct IOException final : DeviceDriverException {
+class IOException final : public DeviceDriverException {
+  public:
     using DeviceDriverException::DeviceDriverException;
 };
 /// A wait that ran out or was abandoned.
-struct TimeoutException final : DeviceDriverException {
+class TimeoutException final : public DeviceDriverException {
+  public:
     using DeviceDriverException::DeviceDriverException;
 };
 

@@ -58,6 +58,16 @@ void PellandoFunctionality::removeListener(Generic::EventListener* listener) try
 }
 TRACED
 
+void PellandoFunctionality::SetScanReceiver(ScanReceiver* receiver) try {
+    implementation->SetScanReceiver(receiver);
+}
+TRACED
+
+void PellandoFunctionality::SetDataStageObserver(DataStageObserver* observer) try {
+    implementation->SetDataStageObserver(observer);
+}
+TRACED
+
 void PellandoFunctionality::MeasureRequest(std::uint8_t* buffer, std::uint32_t length,
                                            std::uint32_t timeoutSeconds) try {
     implementation->MeasureRequest(buffer, length, timeoutSeconds);

@@ -25,6 +25,9 @@ class PellandoFunctionality final {
 
     /// No message reaches the listener once this has returned.
     void removeListener(Generic::EventListener* listener);
+    /// See `PellandoFunctionalityByte`.
+    void SetScanReceiver(ScanReceiver* receiver);
+    void SetDataStageObserver(DataStageObserver* observer);
 
     /// Takes one readout of `length` bytes into `buffer`.
     void MeasureRequest(std::uint8_t* buffer, std::uint32_t length, std::uint32_t timeoutSeconds);

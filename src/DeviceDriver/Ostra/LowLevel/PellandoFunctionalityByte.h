@@ -5,6 +5,8 @@
 #include <string>
 
 #include "DeviceDriver/Generic/EventListener.h"
+#include "DeviceDriver/Ostra/LowLevel/DataStageObserver.h"
+#include "DeviceDriver/Ostra/LowLevel/ScanReceiver.h"
 #include "Utilities/Tools/SmartPointer.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
@@ -22,6 +24,13 @@ using Bytes4 = std::array<std::uint8_t, 4>;
 class PellandoFunctionalityByte {
   public:
     virtual ~PellandoFunctionalityByte() = default;
+
+    /// Neither is owned; both may be null, as they are at first, and change between commands. Without a
+    /// receiver the data of a scan wait for `GetScanData`. With one nothing is kept; what a transfer brought
+    /// that then failed is handed over too, before the failure leaves `StartScan`; each transfer of the scan
+    /// gets the time-out plus 3000 ms on either transport; and an open-ended scan may be of any length.
+    void SetScanReceiver(ScanReceiver* receiver) { scanReceiver = receiver; }
+    void SetDataStageObserver(DataStageObserver* observer) { dataStageObserver = observer; }
 
     /// No message reaches any listener once this has returned.
     virtual void RemoveListener(Generic::EventListener* listener) = 0;
@@ -66,6 +75,18 @@ class PellandoFunctionalityByte {
     /// true, the instrument's own driver otherwise.
     static Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionalityByte> Instance(
         Generic::EventListener* listener, std::uint32_t deviceIndex);
+
+  protected:
+    ScanReceiver* Receiver() const { return scanReceiver; }
+    void DataStageEnded(std::uint32_t asked, std::uint32_t moved) const {
+        if (dataStageObserver != nullptr) {
+            dataStageObserver->DataStageEnded(asked, moved);
+        }
+    }
+
+  private:
+    ScanReceiver* scanReceiver = nullptr;
+    DataStageObserver* dataStageObserver = nullptr;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -7,6 +7,9 @@
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
+/// What a transfer of a scan gets beyond the scan's time-out.
+constexpr std::uint32_t ScanGrace = 3000;  // milliseconds
+
 /// A time-out in milliseconds, computed without wrapping and never `Platform::Infinite`: a caller's huge
 /// time-out must not turn into a short wait or into one without end.
 constexpr std::uint32_t WaitLimit(std::uint64_t milliseconds) {

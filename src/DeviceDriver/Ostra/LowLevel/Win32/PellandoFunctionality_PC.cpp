@@ -8,6 +8,7 @@
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/WaitLimit.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
+#include "Platform/ErrorCodes.h"
 #include "Platform/ScopedThreadPriority.h"
 #include "Protocol/ByteOrder.h"
 #include "Utilities/Exceptions/Location.h"
@@ -41,10 +42,10 @@ PellandoFunctionality_PC::~PellandoFunctionality_PC() = default;
 std::string PellandoFunctionality_PC::GetDeviceAddress(std::uint32_t deviceIndex) try {
     const std::vector<std::string> paths = PellandoUSBDevice::GetAllDevices();
     if (paths.empty()) {
-        throw IOException("No devices connected", Here());
+        throw IOException("No devices connected", Here(), Platform::Errors::FileNotFound);
     }
     if (deviceIndex >= paths.size()) {
-        throw IOException("No such device connected", Here());
+        throw IOException("No such device connected", Here(), Platform::Errors::FileNotFound);
     }
     return paths[deviceIndex];
 }
@@ -54,7 +55,11 @@ void PellandoFunctionality_PC::Transfer(Request request, std::uint8_t direction,
                                         std::uint32_t length) {
     record.block[NativeDriver::Block::Direction] = direction;
     record.block[NativeDriver::Block::Request] = static_cast<std::uint8_t>(request);
-    device->PerformDeviceIOControl(record.block, data, length);
+    const std::uint32_t moved = device->PerformDeviceIOControl(record.block, data, length);
+    // A driver need not say how much it sent: what an instrument is sent it takes as a whole or refuses.
+    if (moved > 0 || direction == NativeDriver::DirectionIn) {
+        DataStageEnded(length, moved);
+    }
 }
 
 void PellandoFunctionality_PC::Send(Request request, std::uint32_t length) {
@@ -97,7 +102,10 @@ void PellandoFunctionality_PC::ReadStrip(std::uint32_t recordSize, std::uint32_t
                                          std::uint32_t total) {
     // A strip read must have its next read queued in time: its thread goes before others while it runs.
     const Platform::ScopedThreadPriority raised(Platform::HighestThreadPriority);
-    if (total != 0) {
+    if (ScanReceiver* const receiver = Receiver()) {
+        total != 0 ? device->ReadDataCountedStrip(*receiver, recordSize, timeout, total)
+                   : device->ReadDataStrip(*receiver, recordSize, timeout);
+    } else if (total != 0) {
         device->ReadDataCountedStrip(scanRecords, recordSize, timeout, total);
     } else {
         device->ReadDataStrip(scanRecords, recordSize, timeout);

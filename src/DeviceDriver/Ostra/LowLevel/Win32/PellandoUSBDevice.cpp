@@ -26,6 +26,7 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace NativeDriver = Protocol::NativeDriver;
 using Generic::EventListener;
 using Generic::Utilities::IOException;
+using Generic::Utilities::Shortfall;
 using Generic::Utilities::TimeoutException;
 using Platform::WaitResult;
 using Varnholt::Utilities::Exceptions::Here;
@@ -39,7 +40,6 @@ constexpr std::uint32_t MaximumDevices = 127;
 constexpr std::uint32_t RecordsPerChunk = 10;
 constexpr std::uint32_t RecordsOfFirstRead = 2;
 constexpr std::uint32_t MaximumChunk = 65535;
-constexpr std::uint32_t StripGrace = 3000;  ///< what a read of a strip gets beyond its time-out
 
 NativeDriver::ControlBlock MakeBlock(std::uint8_t type, std::uint8_t request, std::uint16_t value) {
     NativeDriver::ControlBlock block{};
@@ -60,11 +60,21 @@ std::uint32_t ChunkSize(std::uint32_t recordSize, const SourceLocation& caller =
     return recordSize * RecordsPerChunk;
 }
 
-void AppendRecords(ScanRecordList& records, std::span<const std::uint8_t> data, std::size_t recordSize) {
-    for (; data.size() >= recordSize; data = data.subspan(recordSize)) {
-        records.emplace_back(data.first(recordSize));
+/// Collects the whole records of each transfer; of one that fails, none.
+class RecordCollector final : public ScanReceiver {
+  public:
+    RecordCollector(ScanRecordList& list, std::size_t size) : records(list), recordSize(size) {}
+
+    void Receive(std::span<const std::uint8_t> data) override {
+        for (; data.size() >= recordSize; data = data.subspan(recordSize)) {
+            records.emplace_back(data.first(recordSize));
+        }
     }
-}
+
+  private:
+    ScanRecordList& records;
+    const std::size_t recordSize;
+};
 
 }  // namespace
 
@@ -182,10 +192,11 @@ void PellandoUSBDevice::MessageFromDevice(std::uint32_t code, std::uint32_t para
 }
 TRACED
 
-void PellandoUSBDevice::PerformDeviceIOControl(const NativeDriver::ControlBlock& block, void* data,
-                                               std::uint32_t length) try {
+std::uint32_t PellandoUSBDevice::PerformDeviceIOControl(const NativeDriver::ControlBlock& block, void* data,
+                                                        std::uint32_t length) try {
     const ScopedLock held(core->lock);
-    core->control.PerformDeviceIOControl(block, NativeDriver::ControlVendorRequest, data, length, true);
+    return core->control.PerformDeviceIOControl(block, NativeDriver::ControlVendorRequest, data, length,
+                                                true);
 }
 TRACED
 
@@ -203,16 +214,29 @@ TRACED
 
 void PellandoUSBDevice::ReadDataStrip(ScanRecordList& records, std::uint32_t recordSize,
                                       std::uint32_t timeout) try {
+    RecordCollector collector(records, recordSize);
+    ReadStrip(collector, PartialData::Dropped, recordSize, timeout);
+}
+TRACED
+
+void PellandoUSBDevice::ReadDataStrip(ScanReceiver& receiver, std::uint32_t recordSize,
+                                      std::uint32_t timeout) try {
+    ReadStrip(receiver, PartialData::Received, recordSize, timeout);
+}
+TRACED
+
+void PellandoUSBDevice::ReadStrip(ScanReceiver& receiver, PartialData partialData, std::uint32_t recordSize,
+                                  std::uint32_t timeout) {
     const ScopedLock held(core->lock);
     const std::uint32_t chunk = ChunkSize(recordSize);
-    const std::uint32_t limit = WaitLimit(timeout, StripGrace);
+    const std::uint32_t limit = WaitLimit(timeout, ScanGrace);
     StripReader reader(core->read, chunk);
     reader.Start(RecordsOfFirstRead * recordSize);
     reader.Advance();
     bool isFirst = true;
     for (bool hasEnded = false;;) {
         reader.Start(chunk);
-        AppendRecords(records, reader.Arrived(), recordSize);
+        receiver.Receive(reader.Arrived());
         if (hasEnded) {
             return;
         }
@@ -224,22 +248,37 @@ void PellandoUSBDevice::ReadDataStrip(ScanRecordList& records, std::uint32_t rec
             Platform::Beep(2140, 75);
         }
         if (!reader.HasSucceeded()) {
-            throw IOException("Read data failed (OverlappedRead)", Here());
+            HandOverPartialData(reader, receiver, partialData);
+            throw IOException("Read data failed (OverlappedRead)", Here(), reader.FailureCode());
         }
         if (reader.Count() % recordSize != 0 || reader.Count() > reader.SizeAsked()) {
+            HandOverPartialData(reader, receiver, partialData);
             throw IOException("Read data failed (wrong data size)", Here());
         }
         hasEnded = reader.Count() != reader.SizeAsked();
         reader.Advance();
     }
 }
-TRACED
 
 void PellandoUSBDevice::ReadDataCountedStrip(ScanRecordList& records, std::uint32_t recordSize,
                                              std::uint32_t timeout, std::uint32_t total) try {
+    RecordCollector collector(records, recordSize);
+    ReadCountedStrip(collector, PartialData::Dropped, recordSize, timeout, total);
+}
+TRACED
+
+void PellandoUSBDevice::ReadDataCountedStrip(ScanReceiver& receiver, std::uint32_t recordSize,
+                                             std::uint32_t timeout, std::uint32_t total) try {
+    ReadCountedStrip(receiver, PartialData::Received, recordSize, timeout, total);
+}
+TRACED
+
+void PellandoUSBDevice::ReadCountedStrip(ScanReceiver& receiver, PartialData partialData,
+                                         std::uint32_t recordSize, std::uint32_t timeout,
+                                         std::uint32_t total) {
     const ScopedLock held(core->lock);
     const std::uint32_t chunk = ChunkSize(recordSize);
-    const std::uint32_t limit = WaitLimit(timeout, StripGrace);
+    const std::uint32_t limit = WaitLimit(timeout, ScanGrace);
     std::uint32_t remaining = total;
     const auto takeNext = [&] {
         const std::uint32_t size = std::min(chunk, remaining);
@@ -257,7 +296,7 @@ void PellandoUSBDevice::ReadDataCountedStrip(ScanRecordList& records, std::uint3
         if (next > 0) {
             reader.Start(next);
         }
-        AppendRecords(records, reader.Arrived(), recordSize);
+        receiver.Receive(reader.Arrived());
         if (current == 0) {
             return;
         }
@@ -271,16 +310,29 @@ void PellandoUSBDevice::ReadDataCountedStrip(ScanRecordList& records, std::uint3
                    ", remaining: " + std::to_string(remaining) + ")";
         };
         if (!reader.HasSucceeded()) {
-            throw IOException("system busy. try again. Read data failed (OverlappedRead" + state(), Here());
+            const std::string text = state();
+            HandOverPartialData(reader, receiver, partialData);
+            throw IOException("system busy. try again. Read data failed (OverlappedRead" + text, Here(),
+                              reader.FailureCode());
         }
         if (reader.Count() != current) {
-            throw IOException("system busy. try again. Read data failed (wrong data size" + state(), Here());
+            const Shortfall shortfall{reader.Count(), current};
+            const std::string text = state();
+            HandOverPartialData(reader, receiver, partialData);
+            throw IOException("system busy. try again. Read data failed (wrong data size" + text, Here(),
+                              shortfall);
         }
         reader.Advance();
         current = next;
     }
 }
-TRACED
+
+void PellandoUSBDevice::HandOverPartialData(StripReader& reader, ScanReceiver& receiver,
+                                            PartialData partialData) {
+    if (partialData == PartialData::Received) {
+        receiver.Receive(reader.EndAndTake());
+    }
+}
 
 const std::string& PellandoUSBDevice::GetAddress() const {
     return core->path;

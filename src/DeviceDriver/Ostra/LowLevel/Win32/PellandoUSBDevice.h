@@ -6,11 +6,14 @@
 #include <vector>
 
 #include "DeviceDriver/Generic/EventListener.h"
+#include "DeviceDriver/Ostra/LowLevel/ScanReceiver.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/InterruptListener.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/ScanRecord.h"
 #include "Protocol/NativeDriver.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+
+class StripReader;
 
 /// One opened instrument on its own kernel driver: its pipes, its interrupt listener, and the device lock
 /// that every transfer takes for its whole run. The lock is recursive and shared with everybody on the
@@ -39,9 +42,10 @@ class PellandoUSBDevice final : public Generic::EventListener {
     void RemoveListener(Generic::EventListener* listener);
     void MessageFromDevice(std::uint32_t code, std::uint32_t parameter) override;
 
-    /// A vendor request. `data`: `length` bytes sent or received, as the block's direction says.
-    void PerformDeviceIOControl(const Protocol::NativeDriver::ControlBlock& block, void* data,
-                                std::uint32_t length);
+    /// A vendor request. `data`: `length` bytes sent or received, as the block's direction says. Gives the
+    /// bytes that the driver says it moved.
+    std::uint32_t PerformDeviceIOControl(const Protocol::NativeDriver::ControlBlock& block, void* data,
+                                         std::uint32_t length);
     void ReadData(void* buffer, std::uint32_t length, std::uint32_t timeout);
     void WriteData(const void* buffer, std::uint32_t length, std::uint32_t timeout);
 
@@ -50,6 +54,10 @@ class PellandoUSBDevice final : public Generic::EventListener {
     /// Each transfer gets the time-out plus 3000 ms. Records that came before a failure stay in the list.
     void ReadDataStrip(ScanRecordList& records, std::uint32_t recordSize, std::uint32_t timeout);
     void ReadDataCountedStrip(ScanRecordList& records, std::uint32_t recordSize, std::uint32_t timeout,
+                              std::uint32_t total);
+    /// The same reads for a receiver, which gets every byte that comes, of a transfer that fails too.
+    void ReadDataStrip(ScanReceiver& receiver, std::uint32_t recordSize, std::uint32_t timeout);
+    void ReadDataCountedStrip(ScanReceiver& receiver, std::uint32_t recordSize, std::uint32_t timeout,
                               std::uint32_t total);
 
     const std::string& GetAddress() const;
@@ -64,7 +72,14 @@ class PellandoUSBDevice final : public Generic::EventListener {
 
   private:
     class Core;
+    /// What becomes of the data of a transfer that failed.
+    enum class PartialData { Dropped, Received };
 
+    void ReadStrip(ScanReceiver& receiver, PartialData partialData, std::uint32_t recordSize,
+                   std::uint32_t timeout);
+    void ReadCountedStrip(ScanReceiver& receiver, PartialData partialData, std::uint32_t recordSize,
+                          std::uint32_t timeout, std::uint32_t total);
+    static void HandOverPartialData(StripReader& reader, ScanReceiver& receiver, PartialData partialData);
     void SetupInterruptListener();
     void Shutdown();
     void HandleUntouchedButton();

@@ -1,5 +1,6 @@
 #include "DeviceDriver/Ostra/LowLevel/Win32/StripReader.h"
 
+#include <algorithm>
 #include <utility>
 
 #include "Platform/Time.h"
@@ -47,7 +48,15 @@ WaitResult StripReader::Await(std::uint32_t limit) {
 /// False while the read runs.
 bool StripReader::FetchResult() {
     succeeded = waiting->request.GetResult(count);
+    failure = succeeded ? Platform::Errors::Success : Platform::LastError();
     return !waiting->request.IsRunning();
+}
+
+std::span<const std::uint8_t> StripReader::EndAndTake() {
+    if (waiting->request.IsRunning()) {
+        count = waiting->request.CancelAndWait();
+    }
+    return {waiting->buffer.get(), std::min(count, waiting->asked)};
 }
 
 void StripReader::Advance() {

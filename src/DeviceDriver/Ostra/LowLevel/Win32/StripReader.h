@@ -6,6 +6,7 @@
 #include <span>
 
 #include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
+#include "Platform/ErrorCodes.h"
 #include "Platform/OverlappedRequest.h"
 #include "Platform/WaitableObjects.h"
 
@@ -35,6 +36,8 @@ class StripReader final {
 
     /// The outcome of the read that `Await` waited for; not successful also when it still runs.
     bool HasSucceeded() const { return succeeded; }
+    /// Why not: `Errors::IoIncomplete` when it still ran.
+    Platform::ErrorCode FailureCode() const { return failure; }
     std::uint32_t Count() const { return count; }
     std::uint32_t SizeAsked() const { return waiting->asked; }
 
@@ -43,6 +46,10 @@ class StripReader final {
     void Advance();
 
     std::span<const std::uint8_t> Arrived() const { return {arrived.get(), arrivedCount}; }
+
+    /// Ends the read that was waited for, if it still runs, and gives what it has brought. For a read that
+    /// failed; nothing can be started afterwards.
+    std::span<const std::uint8_t> EndAndTake();
 
   private:
     using Buffer = std::unique_ptr<std::uint8_t[]>;
@@ -64,6 +71,7 @@ class StripReader final {
     PendingRead* waiting = &first;
     PendingRead* following = &second;
     bool succeeded = false;
+    Platform::ErrorCode failure = Platform::Errors::Success;
     std::uint32_t count = 0;
 };
 

@@ -12,6 +12,7 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace {
 
 using Generic::Utilities::IOException;
+using Generic::Utilities::Shortfall;
 using Generic::Utilities::TimeoutException;
 using Platform::NoHandle;
 using Platform::OverlappedRequest;
@@ -20,6 +21,10 @@ using Varnholt::Utilities::Exceptions::Here;
 
 constexpr std::uint32_t ControlWaitLimit = 2000;
 constexpr std::uint32_t TransferGrace = 5000;  ///< what a transfer gets beyond its time-out
+
+std::string TextOf(Platform::ErrorCode code) {
+    return " (Win32 Error (" + std::to_string(code) + ") : " + Platform::ErrorText(code) + ")";
+}
 
 }  // namespace
 
@@ -52,8 +57,8 @@ TRACED
 Platform::Handle USBConnection::OpenPipe(const std::string& name) try {
     const Platform::Handle opened = Platform::DeviceFiles().Open(name);
     if (opened == Platform::InvalidHandle()) {
-        const std::string error = GetErrorText();
-        throw IOException("could not open pipe:" + error, Here());
+        const Platform::ErrorCode error = Platform::LastError();
+        throw IOException("could not open pipe:" + TextOf(error), Here(), error);
     }
     return opened;
 }
@@ -69,26 +74,27 @@ void USBConnection::Close() noexcept {
     }
 }
 
-void USBConnection::PerformDeviceIOControl(const Protocol::NativeDriver::ControlBlock& block,
-                                           std::uint32_t code, void* data, std::uint32_t length,
-                                           bool reportFailures) try {
+std::uint32_t USBConnection::PerformDeviceIOControl(const Protocol::NativeDriver::ControlBlock& block,
+                                                    std::uint32_t code, void* data, std::uint32_t length,
+                                                    bool reportFailures) try {
     Platform::SleepMilliseconds(1);
     OverlappedRequest request(CompletionEvent());
     request.StartControl(pipeHandle, code, block.data(), static_cast<std::uint32_t>(block.size()), data,
                          length);
     const WaitResult waited = Platform::Wait(request.CompletionEvent(), ControlWaitLimit);
     if (!reportFailures) {
-        return;
+        return 0;
     }
     if (waited != WaitResult::Signalled) {
-        const std::string error = GetErrorText();
-        throw TimeoutException("Device IO control failed " + error, Here());
+        const Platform::ErrorCode error = Platform::LastError();
+        throw TimeoutException("Device IO control failed " + TextOf(error), Here(), error);
     }
     std::uint32_t transferred = 0;
     if (!request.GetResult(transferred)) {
-        const std::string error = GetErrorText();
-        throw IOException("Device IO control failed: " + error, Here());
+        const Platform::ErrorCode error = Platform::LastError();
+        throw IOException("Device IO control failed: " + TextOf(error), Here(), error);
     }
+    return transferred;
 }
 TRACED
 
@@ -132,24 +138,21 @@ void USBConnection::CompleteOverlappedIO(OverlappedRequest& request, std::uint32
                                          std::uint32_t timeout, const std::string& name) try {
     if (Platform::Wait(request.CompletionEvent(), WaitLimit(timeout, TransferGrace)) ==
         WaitResult::Abandoned) {
-        const std::string error = GetErrorText();
-        throw TimeoutException(name + " data failed (wait abandoned)" + error, Here());
+        const Platform::ErrorCode error = Platform::LastError();
+        throw TimeoutException(name + " data failed (wait abandoned)" + TextOf(error), Here(), error);
     }
     std::uint32_t transferred = 0;
     if (!request.GetResult(transferred)) {
-        const std::string error = GetErrorText();
-        throw IOException(name + " data failed" + error, Here());
+        const Platform::ErrorCode error = Platform::LastError();
+        throw IOException(name + " data failed" + TextOf(error), Here(), error);
     }
     if (transferred != expected) {
-        throw IOException(name + " data failed (Not enough data)", Here());
+        throw IOException(name + " data failed (Not enough data)", Here(), Shortfall{transferred, expected});
     }
 }
 TRACED
 
-std::string USBConnection::GetErrorText() try {
-    const Platform::ErrorCode code = Platform::LastError();
-    return " (Win32 Error (" + std::to_string(code) + ") : " + Platform::ErrorText(code) + ")";
-}
+std::string USBConnection::GetErrorText() try { return TextOf(Platform::LastError()); }
 TRACED
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

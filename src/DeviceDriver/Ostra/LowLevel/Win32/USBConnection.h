@@ -32,10 +32,12 @@ class USBConnection final {
     /// Harmless when closed. On another thread than the one that transfers it ends the transfer.
     void Close() noexcept;
 
-    /// One device control with `length` bytes of data in either direction; waits 2000 ms at most.
-    /// `TimeoutException` or `IOException`, nothing with `reportFailures` clear.
-    void PerformDeviceIOControl(const Protocol::NativeDriver::ControlBlock& block, std::uint32_t code,
-                                void* data, std::uint32_t length, bool reportFailures);
+    /// One device control with `length` bytes of data in either direction; waits 2000 ms at most. Gives the
+    /// bytes that the driver says it moved. `TimeoutException` or `IOException`; with `reportFailures` clear
+    /// neither these nor the bytes.
+    std::uint32_t PerformDeviceIOControl(const Protocol::NativeDriver::ControlBlock& block,
+                                         std::uint32_t code, void* data, std::uint32_t length,
+                                         bool reportFailures);
 
     /// Move exactly `length` bytes within the time-out plus 5000 ms, or throw: `IOException`, also when the
     /// time ran out; `TimeoutException` when the wait was abandoned.

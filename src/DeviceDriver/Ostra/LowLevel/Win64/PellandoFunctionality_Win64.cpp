@@ -10,6 +10,7 @@
 #include "DeviceDriver/Generic/Utilities/Timing.h"
 #include "DeviceDriver/Ostra/LowLevel/WaitLimit.h"
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
+#include "Platform/ErrorCodes.h"
 #include "Platform/ScopedThreadPriority.h"
 #include "Platform/Time.h"
 #include "UsbIo/ScopedDeviceList.h"
@@ -62,7 +63,7 @@ void ThrowIfUsbIoError(std::uint32_t status, const char* operation) {
     std::array<char, 1024> text;
     throw IOException(std::string("Error in UsbIo function: \"") + operation +
                           "\" Error: " + CUsbIo::ErrorText(text.data(), text.size(), status),
-                      Here());
+                      Here(), status);
 }
 
 template <std::size_t Size>
@@ -93,7 +94,7 @@ PellandoFunctionality_Win64::~PellandoFunctionality_Win64() = default;
 void PellandoFunctionality_Win64::InitUSBIO(std::uint32_t deviceIndex) try {
     const std::list<std::string> names = USB::USBBrowser::Instance()->GetDevices(0);
     if (deviceIndex >= names.size()) {
-        throw IOException("No such device connected", Here());
+        throw IOException("No such device connected", Here(), Platform::Errors::FileNotFound);
     }
     const std::string& wanted = *std::next(names.begin(), static_cast<std::ptrdiff_t>(deviceIndex));
     const UsbIo::ScopedDeviceList list(InterfaceClass);
@@ -111,7 +112,7 @@ void PellandoFunctionality_Win64::InitUSBIO(std::uint32_t deviceIndex) try {
         }
         device->Close();
     }
-    throw IOException("requested device not found", Here());
+    throw IOException("requested device not found", Here(), Platform::Errors::FileNotFound);
 }
 TRACED
 
@@ -140,6 +141,7 @@ void PellandoFunctionality_Win64::VendorOutRequest(Request request, const Bytes&
     auto length = static_cast<std::uint32_t>(data.size());
     ThrowIfUsbIoError(device->ClassOrVendorOutRequest(data.empty() ? nullptr : data.data(), length, block),
                       "ClassOrVendorOutRequest");
+    DataStageEnded(static_cast<std::uint32_t>(data.size()), length);
 }
 TRACED
 
@@ -150,17 +152,22 @@ void PellandoFunctionality_Win64::VendorInRequest(Request request, Bytes& data) 
     auto length = static_cast<std::uint32_t>(data.size());
     ThrowIfUsbIoError(device->ClassOrVendorInRequest(data.empty() ? nullptr : data.data(), length, block),
                       "ClassOrVendorInRequest");
+    DataStageEnded(static_cast<std::uint32_t>(data.size()), length);
 }
 TRACED
 
 void PellandoFunctionality_Win64::ReadData(std::uint8_t* buffer, std::uint32_t length,
                                            std::uint64_t timeout) try {
-    ThrowIfUsbIoError(readPipe->ReadSync(buffer, length, WaitLimit(timeout + ReadGrace)), "ReadSync");
+    std::uint32_t moved = length;
+    ThrowIfUsbIoError(readPipe->ReadSync(buffer, moved, WaitLimit(timeout + ReadGrace)), "ReadSync");
+    DataStageEnded(length, moved);
 }
 TRACED
 
 void PellandoFunctionality_Win64::WriteData(const std::uint8_t* buffer, std::uint32_t length) try {
-    ThrowIfUsbIoError(writePipe->WriteSync(buffer, length, Platform::Infinite), "WriteSync");
+    std::uint32_t moved = length;
+    ThrowIfUsbIoError(writePipe->WriteSync(buffer, moved, Platform::Infinite), "WriteSync");
+    DataStageEnded(length, moved);
 }
 TRACED
 
@@ -304,8 +311,10 @@ void PellandoFunctionality_Win64::GetDeviceIdentifier(std::string& identifier) t
 }
 TRACED
 
-void PellandoFunctionality_Win64::StartScan(std::uint32_t, std::uint32_t, std::uint32_t total) try {
+void PellandoFunctionality_Win64::StartScan(std::uint32_t, std::uint32_t timeoutSeconds,
+                                            std::uint32_t total) try {
     PrepareScan(total);
+    receiverLimit = WaitLimit(timeoutSeconds * MillisecondsPerSecond + ScanGrace);
     if (!fixedSize) {
         StartBeep();
     }
@@ -325,10 +334,15 @@ TRACED
 
 void PellandoFunctionality_Win64::PrepareScan(std::uint32_t total) {
     fixedSize = total != 0;
+    scanTotal = total;
     received = 0;
     readPosition = 0;
     scanEnd = 0;
-    scanData.Reset(fixedSize ? total : OpenEndedScanStartSize);
+    if (Receiver() == nullptr) {
+        scanData.Reset(fixedSize ? scanTotal : OpenEndedScanStartSize);
+    } else {
+        scanData.Reset(0);
+    }
 }
 
 void PellandoFunctionality_Win64::ReadMeasureData() try {
@@ -340,31 +354,38 @@ void PellandoFunctionality_Win64::ReadMeasureData() try {
     }
     CUsbIoBuffer* current = &a;
     CUsbIoBuffer* next = &b;
-    current->NumberOfBytesToTransfer =
-        fixedSize ? static_cast<std::uint32_t>(std::min<std::size_t>(scanData.Size(), ScanTransferSize))
-                  : ScanTransferSize;
+    current->NumberOfBytesToTransfer = fixedSize ? std::min(scanTotal, ScanTransferSize) : ScanTransferSize;
     readPipe->Read(*current);
     while (ReadMeasureDataInternal(*current, *next)) {
         std::swap(current, next);
     }
-    scanData.Resize(received);
+    if (Receiver() == nullptr) {
+        scanData.Resize(static_cast<std::size_t>(received));
+    }
 }
 TRACED
 
 bool PellandoFunctionality_Win64::ReadMeasureDataInternal(CUsbIoBuffer& current, CUsbIoBuffer& next) try {
     next.NumberOfBytesToTransfer = ScanTransferSize;
-    const std::uint64_t asked = std::uint64_t{received} + current.NumberOfBytesToTransfer;
-    if (fixedSize && asked <= scanData.Size()) {
+    const std::uint64_t asked = received + current.NumberOfBytesToTransfer;
+    if (fixedSize && asked <= scanTotal) {
         next.NumberOfBytesToTransfer =
-            static_cast<std::uint32_t>(std::min<std::uint64_t>(scanData.Size() - asked, ScanTransferSize));
+            static_cast<std::uint32_t>(std::min<std::uint64_t>(scanTotal - asked, ScanTransferSize));
     }
     // Where it cannot be started, the wait for it will tell.
     readPipe->Read(next);
 
-    const std::uint32_t timeout = current.NumberOfBytesToTransfer / ScanRecordSize * ScanRecordTime +
-                                  static_cast<std::uint32_t>(ReadGrace);
-    ThrowIfUsbIoError(readPipe->WaitForCompletion(current, timeout), "WaitForCompletion1");
-    CopyDataToBufferInternal(current);
+    const std::uint32_t timeout = Receiver() != nullptr
+                                      ? receiverLimit
+                                      : current.NumberOfBytesToTransfer / ScanRecordSize * ScanRecordTime +
+                                            static_cast<std::uint32_t>(ReadGrace);
+    const std::uint32_t status = readPipe->WaitForCompletion(current, timeout);
+    if (status != Status::Success && Receiver() != nullptr) {
+        readPipe->CancelToCompletion(current);
+        TakeScanData(current);
+    }
+    ThrowIfUsbIoError(status, "WaitForCompletion1");
+    TakeScanData(current);
     if (current.BytesTransferred > 0 && current.BytesTransferred >= current.NumberOfBytesToTransfer) {
         return true;
     }
@@ -374,12 +395,24 @@ bool PellandoFunctionality_Win64::ReadMeasureDataInternal(CUsbIoBuffer& current,
 }
 TRACED
 
+void PellandoFunctionality_Win64::TakeScanData(const CUsbIoBuffer& buffer) {
+    if (Receiver() == nullptr) {
+        CopyDataToBufferInternal(buffer);
+        return;
+    }
+    if (fixedSize && buffer.BytesTransferred > scanTotal - received) {
+        throw DataException("more bytes read than expected", Here());
+    }
+    received += buffer.BytesTransferred;
+    Receiver()->Receive({static_cast<const std::uint8_t*>(buffer.Buffer), buffer.BytesTransferred});
+}
+
 void PellandoFunctionality_Win64::CopyDataToBufferInternal(const CUsbIoBuffer& buffer) try {
     const std::uint32_t count = buffer.BytesTransferred;
     if (count == 0) {
         return;
     }
-    const std::uint64_t end = std::uint64_t{received} + count;
+    const std::uint64_t end = received + count;
     if (scanData.Capacity() < end) {
         if (fixedSize) {
             throw DataException("buffer size is fix", Here());
@@ -393,7 +426,7 @@ void PellandoFunctionality_Win64::CopyDataToBufferInternal(const CUsbIoBuffer& b
         scanData.Resize(static_cast<std::size_t>(end));
     }
     std::memcpy(scanData.Data() + received, buffer.Buffer, count);
-    received = static_cast<std::uint32_t>(end);
+    received = end;
 }
 TRACED
 

@@ -25,8 +25,9 @@ class PellandoFunctionality_Win64 final : public PellandoFunctionalityByte {
     /// Any listener is taken away, whatever the argument. May be called from inside a message.
     void RemoveListener(Generic::EventListener* listener) override;
 
-    /// Record size and time-out are not used by this transport. An open-ended scan (`total` 0) sounds a beep
-    /// 370 ms after its start, from a thread that outlives the call by at most half a second.
+    /// The record size is not used by this transport, the time-out only with a receiver. An open-ended scan
+    /// (`total` 0) sounds a beep 370 ms after its start, from a thread that outlives the call by at most half
+    /// a second.
     void StartScan(std::uint32_t recordSize, std::uint32_t timeoutSeconds, std::uint32_t total) override;
     /// Where fewer than `*size` bytes remain, those are copied and `*size` becomes their number.
     void GetScanData(std::uint8_t* buffer, std::uint32_t* size) override;
@@ -75,6 +76,7 @@ class PellandoFunctionality_Win64 final : public PellandoFunctionalityByte {
     void ReadMeasureData();
     /// True while the scan goes on.
     bool ReadMeasureDataInternal(UsbIo::CUsbIoBuffer& current, UsbIo::CUsbIoBuffer& next);
+    void TakeScanData(const UsbIo::CUsbIoBuffer& buffer);
     void CopyDataToBufferInternal(const UsbIo::CUsbIoBuffer& buffer);
     static void StartBeep();
     static void BeepTask();
@@ -87,11 +89,13 @@ class PellandoFunctionality_Win64 final : public PellandoFunctionalityByte {
     Varnholt::Utilities::Tools::SmartPointer<InterruptListener_Win64> interruptListener;
     std::string devicePath;
 
-    ScanBuffer scanData;             ///< of the last scan
-    std::uint32_t received = 0;      ///< bytes of `scanData` that the running scan has filled
-    std::uint32_t readPosition = 0;  ///< next byte that `GetScanData` hands out
-    std::uint32_t scanEnd = 0;       ///< bytes that it can hand out
-    bool fixedSize = true;           ///< the running scan was asked for a number of bytes
+    ScanBuffer scanData;              ///< of the last scan
+    std::uint64_t received = 0;       ///< bytes that the running scan has brought
+    std::uint32_t readPosition = 0;   ///< next byte that `GetScanData` hands out
+    std::uint32_t scanEnd = 0;        ///< bytes that it can hand out
+    bool fixedSize = true;            ///< the running scan was asked for a number of bytes
+    std::uint32_t scanTotal = 0;      ///< that number
+    std::uint32_t receiverLimit = 0;  ///< milliseconds for a transfer of a scan that has a receiver
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

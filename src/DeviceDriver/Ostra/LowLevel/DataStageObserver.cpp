@@ -1,0 +1,18 @@
+#include "DeviceDriver/Ostra/LowLevel/DataStageObserver.h"
+
+#include <string>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "Utilities/Exceptions/Location.h"
+
+namespace Varnholt::DeviceDriver::Ostra::LowLevel {
+
+void WholeDataStages::DataStageEnded(std::uint32_t asked, std::uint32_t moved) {
+    if (moved != asked) {
+        throw Generic::Utilities::IOException(
+            std::to_string(moved) + " of " + std::to_string(asked) + " bytes came",
+            Varnholt::Utilities::Exceptions::Here(), Generic::Utilities::Shortfall{moved, asked});
+    }
+}
+
+}  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

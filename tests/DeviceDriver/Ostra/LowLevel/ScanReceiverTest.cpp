@@ -1,0 +1,161 @@
+// Scans whose data go to a receiver as they arrive, and the counting of what commands move, by either
+// transport.
+#include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
+#include "Platform/ErrorCodes.h"
+#include "Protocol/UsbIoDriver.h"
+#include "Support/DriverTest.h"
+#include "Support/SimulatedHost.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using namespace DeviceDriver::Ostra::LowLevel;
+using Bytes = std::vector<std::uint8_t>;
+
+struct CollectingReceiver final : ScanReceiver {
+    void Receive(std::span<const std::uint8_t> data) override {
+        if (bytes.size() + data.size() > limit) {
+            throw DeviceDriver::Generic::Utilities::DataException("enough", "here");
+        }
+        bytes.insert(bytes.end(), data.begin(), data.end());
+    }
+
+    Bytes bytes;
+    std::size_t limit = SIZE_MAX;
+};
+
+class ReceivedScan : public testing::TestWithParam<Transport> {
+  protected:
+    static constexpr std::uint32_t Record = 256;
+    static constexpr std::uint32_t Records = 1000;
+
+    static Simulator::InstrumentSettings Streaming() {
+        Simulator::InstrumentSettings settings;
+        settings.scanBytes = std::uint64_t{Record} * Records;
+        return settings;
+    }
+    static bool IsNative() { return GetParam() == Transport::Native; }
+
+    /// The noise of the readings goes on from one measurement to the next: each scan has an instrument anew.
+    static Bytes Collected(std::uint32_t total) {
+        SimulatedHost host(GetParam());
+        host.Add("a", Streaming());
+        PellandoFunctionality instrument(nullptr, 0);
+        instrument.StartScan(Record, 1, total);
+        Bytes all;
+        for (Bytes record(Record);;) {
+            std::uint32_t size = Record;
+            instrument.GetScanData(record.data(), size);
+            if (size == 0) {
+                return all;
+            }
+            all.insert(all.end(), record.data(), record.data() + size);
+        }
+    }
+
+    TestClock clock{TestTime::Virtual};
+};
+INSTANTIATE_TEST_SUITE_P(Transports, ReceivedScan, testing::Values(Transport::Native, Transport::UsbIo),
+                         [](const auto& parameter) { return std::string(Name(parameter.param)); });
+
+TEST_P(ReceivedScan, BringsWhatWouldBeCollectedAndWhatCameBeforeAFailure) {
+    constexpr std::uint32_t total = Record * Records;
+    const std::uint32_t first = IsNative() ? 10 * Record : 65536;  // bytes of a counted scan's transfers
+    struct Case {
+        const char* faults;
+        std::uint32_t total;
+        std::size_t received;
+        std::optional<std::uint32_t> usbIoCode;
+        std::optional<std::uint32_t> nativeCode;
+    };
+    using namespace Protocol::UsbIoDriver;
+    for (const Case& row : {
+             Case{"", total, total, {}, {}},
+             Case{"", 0, total, {}, {}},
+             Case{"", 5 * Record, 5 * Record, {}, {}},
+             Case{"bulk-in 2:silent", total, 2 * first, Status::TimedOut, Platform::Errors::IoIncomplete},
+             Case{"bulk-in 2:late-cancel", total, std::size_t{3} * first, Status::TimedOut,
+                  Platform::Errors::IoIncomplete},
+             Case{"bulk-in 1:stall", total, first, Status::EndpointHalted, Platform::Errors::GeneralFailure},
+         }) {
+        SCOPED_TRACE(std::string(row.faults) + " of " + std::to_string(row.total));
+        SimulatedHost host(GetParam());
+        host.Add("a", Streaming());
+        if (*row.faults != '\0') {
+            host.Bus().SetFaults("a", Simulator::FaultPlan::Parse(row.faults));
+        }
+        CollectingReceiver receiver;
+        std::optional<std::uint32_t> code;
+        {
+            PellandoFunctionality instrument(nullptr, 0);
+            instrument.SetScanReceiver(&receiver);
+            const Stopwatch watch(clock);
+            try {
+                instrument.StartScan(Record, 1, row.total);
+            } catch (const IOException& exception) {
+                code = exception.Code();
+            }
+            watch.ExpectAtMost(4100);  // the time-out and its grace, on both
+            std::uint32_t size = Record;
+            Bytes record(Record);
+            instrument.GetScanData(record.data(), size);
+            EXPECT_EQ(size, 0U) << "nothing is collected beside a receiver";
+        }
+        const Bytes all = Collected(total);
+        EXPECT_EQ(receiver.bytes.size(), row.received);
+        EXPECT_TRUE(std::equal(receiver.bytes.begin(), receiver.bytes.end(), all.begin()));
+        EXPECT_EQ(code, IsNative() ? row.nativeCode : row.usbIoCode);
+    }
+}
+
+TEST_P(ReceivedScan, EndsWithWhatItsReceiverThrows) {
+    SimulatedHost host(GetParam());
+    host.Add("a", Streaming());
+    PellandoFunctionality instrument(nullptr, 0);
+    CollectingReceiver receiver;
+    receiver.limit = 100000;
+    instrument.SetScanReceiver(&receiver);
+    EXPECT_THROW(instrument.StartScan(Record, 1, 0), DeviceDriver::Generic::Utilities::DataException);
+    EXPECT_GT(receiver.bytes.size(), 0U);
+    instrument.SetScanReceiver(nullptr);
+    instrument.StartScan(Record, 1, Record);
+    std::uint32_t size = Record;
+    Bytes record(Record);
+    instrument.GetScanData(record.data(), size);
+    EXPECT_EQ(size, Record) << "the next scan is collected again";
+}
+
+TEST_P(ReceivedScan, DataStagesAreCounted) {
+    struct Stages final : DataStageObserver {
+        void DataStageEnded(std::uint32_t asked, std::uint32_t moved) override {
+            seen.emplace_back(asked, moved);
+        }
+        std::vector<std::pair<std::uint32_t, std::uint32_t>> seen;
+    } stages;
+    SimulatedHost host(GetParam());
+    host.Add("a");
+    host.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 1:short=3; bulk-in 0:short=32"));
+    PellandoFunctionality instrument(nullptr, 0);
+    instrument.SetDataStageObserver(&stages);
+    std::uint8_t m1 = 0, m3 = 0;
+    std::uint16_t m2 = 0, m4 = 0, m5 = 0;
+    instrument.GetMISC(m1, m2, m3, m4, m5);
+    Bytes image(64);
+    try {
+        instrument.ReadEEPROM(0, image);
+        EXPECT_FALSE(IsNative());
+    } catch (const IOException& exception) {
+        ASSERT_TRUE(IsNative() && exception.MissingData());
+        EXPECT_EQ(exception.MissingData()->moved, 32U);
+        EXPECT_EQ(exception.MissingData()->asked, 64U);
+        stages.seen.emplace_back(64, 32);
+    }
+    using testing::Pair;
+    EXPECT_THAT(stages.seen, testing::ElementsAre(Pair(8U, 3U), Pair(8U, 8U), Pair(64U, 32U)));
+    WholeDataStages whole;
+    EXPECT_NO_THROW(whole.DataStageEnded(7, 7));
+    EXPECT_THROW(whole.DataStageEnded(7, 6), IOException);
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests
