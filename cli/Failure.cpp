@@ -1,10 +1,10 @@
 #include "Failure.h"
 
+#include <fmt/format.h>
+
 #include <array>
-#include <charconv>
 #include <ios>
 #include <new>
-#include <string_view>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Platform/ErrorCodes.h"
@@ -52,10 +52,6 @@ const std::array Meanings{
     CodeMeaning{BusTimeout, ExitCode::Timeout, SilentMessage, SilentAdvice},
 };
 
-/// Texts of the transports for an instrument that is not in the list.
-constexpr std::array<std::string_view, 3> MissingTexts{"No devices connected", "No such device connected",
-                                                       "requested device not found"};
-
 std::string Tidy(std::string text) {
     // A Windows system text ends with a line break of its own.
     for (std::size_t at = 0; (at = text.find_first_of("\r\n", at)) != std::string::npos;) {
@@ -68,42 +64,22 @@ std::string WithReason(const char* message, const std::string& reason) {
     return reason.empty() ? message : std::string(message) + " (" + reason + ")";
 }
 
-FailureReport OfTransfer(const std::string& text) {
-    for (const std::string_view missing : MissingTexts) {
-        if (text == missing) {
-            return {ExitCode::NoInstrument, WithReason(UnpluggedMessage, text), UnpluggedAdvice};
+FailureReport OfTransfer(const DeviceDriver::Generic::Utilities::DeviceDriverException& exception) {
+    const std::string text = Tidy(exception.what());
+    for (const CodeMeaning& meaning : Meanings) {
+        if (exception.Code() == meaning.code) {
+            return {meaning.exitCode, WithReason(meaning.message, text), meaning.advice};
         }
     }
-    if (const auto code = SystemCodeIn(text)) {
-        for (const CodeMeaning& meaning : Meanings) {
-            if (meaning.code == *code) {
-                return {meaning.exitCode, WithReason(meaning.message, text), meaning.advice};
-            }
-        }
+    if (const auto missing = exception.MissingData()) {
+        const std::string counts = fmt::format("{} of {} bytes came", missing->moved, missing->asked);
+        return {ExitCode::InputOutput, text == counts ? counts : WithReason(counts.c_str(), text),
+                SystemAdvice::TransferFailed};
     }
     return {ExitCode::InputOutput, WithReason("a transfer failed", text), SystemAdvice::TransferFailed};
 }
 
 }  // namespace
-
-std::optional<std::uint32_t> SystemCodeIn(const std::string& text) {
-    struct Form {
-        std::string_view lead;
-        int base;
-    };
-    for (const Form& form : {Form{"Win32 Error (", 10}, Form{"Error code 0x", 16}}) {
-        const std::size_t at = text.rfind(form.lead);
-        if (at == std::string::npos) {
-            continue;
-        }
-        const char* const first = text.data() + at + form.lead.size();
-        std::uint32_t code = 0;
-        if (std::from_chars(first, text.data() + text.size(), code, form.base).ec == std::errc()) {
-            return code;
-        }
-    }
-    return std::nullopt;
-}
 
 FailureReport Describe(const std::exception_ptr& failure) {
     using namespace DeviceDriver::Generic::Utilities;
@@ -113,7 +89,7 @@ FailureReport Describe(const std::exception_ptr& failure) {
         return {exception.Code(), exception.what(), exception.Advice()};
     } catch (const TimeoutException& exception) {
         // A transfer that a removed instrument cannot even begin is reported as a wait that failed.
-        FailureReport report = OfTransfer(Tidy(exception.what()));
+        FailureReport report = OfTransfer(exception);
         if (report.code == ExitCode::InputOutput) {
             report = {ExitCode::Timeout, WithReason(SilentMessage, Tidy(exception.what())), SilentAdvice};
         }
@@ -121,7 +97,7 @@ FailureReport Describe(const std::exception_ptr& failure) {
     } catch (const DataException& exception) {
         return {ExitCode::BadData, Tidy(exception.what()), {}};
     } catch (const IOException& exception) {
-        return OfTransfer(Tidy(exception.what()));
+        return OfTransfer(exception);
     } catch (const Utilities::Exceptions::TraceableException& exception) {
         return {ExitCode::Other, Tidy(exception.what()), {}};
     } catch (const std::bad_alloc&) {

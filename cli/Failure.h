@@ -1,8 +1,6 @@
 #pragma once
 
-#include <cstdint>
 #include <exception>
-#include <optional>
 #include <stdexcept>
 #include <string>
 
@@ -34,9 +32,5 @@ struct FailureReport {
 
 /// Sorts any exception, the library's or the tool's, into its class of failure.
 FailureReport Describe(const std::exception_ptr& failure);
-
-/// The operating system's or driver's code that the text of a library exception ends with: both transports
-/// put it there in a fixed form.
-std::optional<std::uint32_t> SystemCodeIn(const std::string& text);
 
 }  // namespace Varnholt::Cli

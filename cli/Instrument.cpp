@@ -103,6 +103,7 @@ Instrument::Instrument(Session& usedSession, const InstrumentOptions& options, C
     std::string opened;
     try {
         transport = Transport::Instance(listener, static_cast<std::uint32_t>(index));
+        transport->SetDataStageObserver(&wholeData);
         transport->GetDeviceIdentifier(opened);
         if (opened == identifier) {
             commands = SmartPointer<CommandSet>(new CommandSet(transport));

@@ -4,6 +4,7 @@
 #include <vector>
 
 #include "DeviceDriver/Generic/EventListener.h"
+#include "DeviceDriver/Ostra/LowLevel/DataStageObserver.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
 #include "Session.h"
 
@@ -26,7 +27,7 @@ std::string ShortNameOf(const std::string& identifier);
 /// short name, else the only one whose identifier ends so. Empty: the first. Throws `ToolFailure`.
 std::size_t FindInstrument(const std::vector<std::string>& identifiers, const std::string& name);
 
-/// One opened (and thereby reset) instrument.
+/// One opened (and thereby reset) instrument. A command whose data come short fails, on either transport.
 class Instrument final {
   public:
     using Transport = DeviceDriver::Ostra::LowLevel::PellandoFunctionalityByte;
@@ -56,6 +57,7 @@ class Instrument final {
     Session& session;
     std::string identifier;
     DeviceDriver::Generic::EventListener* const messageListener;
+    DeviceDriver::Ostra::LowLevel::WholeDataStages wholeData;  ///< told by the transport
     Utilities::Tools::SmartPointer<Transport> transport;
     Utilities::Tools::SmartPointer<CommandSet> commands;
 };
