@@ -47,6 +47,21 @@ class Mailbox final : public DeviceDriver::Generic::EventListener {
 };
 
 constexpr std::uint32_t LookInterval = 20;  // milliseconds
+/// A system may list an instrument for a moment after it has gone.
+constexpr int LooksForAGoneOne = 50;
+
+/// The end of the messages looks like a removal, whatever ended them.
+bool IsRemoved(Session& session, const std::string& identifier) {
+    for (int look = 0; look < LooksForAGoneOne; ++look) {
+        if (!IsConnected(identifier)) {
+            return true;
+        }
+        if (!session.UserInterruption().Sleep(LookInterval)) {
+            break;
+        }
+    }
+    return false;
+}
 
 void Monitor(Session& session, const Options& options) {
     Mailbox mailbox;
@@ -59,6 +74,11 @@ void Monitor(Session& session, const Options& options) {
         for (const Mailbox::Message& message : mailbox.Take()) {
             const bool isButton = message.code == DeviceDriver::Generic::MessageButtonData;
             isGone = isGone || message.code == DeviceDriver::Generic::MessageDeviceGone;
+            if (isGone && !IsRemoved(session, instrument.Identifier())) {
+                throw ToolFailure(ExitCode::InputOutput,
+                                  instrument.Identifier() + ": its events could not be read any more",
+                                  "it is still connected: watch it again");
+            }
             const double seconds = static_cast<double>(std::max(message.milliseconds, start) - start) / 1000;
             const char* const event = isButton ? "button" : isGone ? "removed" : "unknown";
             if (options.json) {

@@ -1,10 +1,8 @@
 #include <fmt/format.h>
 
-#include <span>
-
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
-#include "Memory/EepromFile.h"
+#include "Memory/EepromWrite.h"
 #include "Output/Json.h"
 #include "Protocol/Instrument.h"
 
@@ -20,29 +18,17 @@ struct Options {
 void WriteImage(Session& session, const Options& options) {
     const EepromImage image = ReadImageFile(options.file);
     Instrument instrument(session, options.instrument, Instrument::Choice::MustBeNamed);
-    const Interruption::Deferral deferral(session.UserInterruption());
-    constexpr std::uint32_t pieces = Protocol::EepromSize / Protocol::EepromWritePiece;
-    std::uint32_t written = 0;
-    try {
-        Progress progress = session.MakeProgress("writing", pieces, "pieces");
-        for (; written < pieces; ++written) {
-            session.UserInterruption().ThrowIfRequested();
-            const std::uint32_t address = written * Protocol::EepromWritePiece;
-            const auto piece = std::span(image).subspan(address, Protocol::EepromWritePiece);
-            instrument.Commands().WriteEEPROM(address, {piece.begin(), piece.end()});
-            progress.Update(written + 1);
-        }
-    } catch (...) {
-        const FailureReport report = session.Explain(std::current_exception());
-        throw ToolFailure(
-            report.code, fmt::format("{}; {} of {} pieces were written", report.message, written, pieces),
-            written == 0 ? report.advice
-                         : "the EEPROM is neither the old nor the new one: write an image again");
+    std::vector<WritePiece> pieces;
+    for (std::uint32_t at = 0; at < Protocol::EepromSize; at += Protocol::EepromWritePiece) {
+        pieces.push_back({at, Protocol::EepromWritePiece});
     }
+    WriteEeprom(session, instrument, image, pieces,
+                "the EEPROM may be neither the old nor the new one: write an image again");
     if (options.json) {
-        session.Print({{"identifier", instrument.Identifier()}, {"file", options.file}, {"pieces", pieces}});
+        session.Print(
+            {{"identifier", instrument.Identifier()}, {"file", options.file}, {"pieces", pieces.size()}});
     } else {
-        session.Out() << options.file << " written to " << instrument.Identifier() << " in " << pieces
+        session.Out() << options.file << " written to " << instrument.Identifier() << " in " << pieces.size()
                       << " pieces\n";
     }
 }
@@ -51,9 +37,10 @@ void WriteImage(Session& session, const Options& options) {
 
 void AddWriteImage(CommandSpec app, Session& session) {
     const auto options = std::make_shared<Options>();
-    CommandSpec command = app.AddCommand("write-image",
-                                         "write an EEPROM image as it is, unchecked, as the library "
-                                         "does (`ostra eeprom write` is the safe way)");
+    CommandSpec command =
+        app.AddCommand("write-image",
+                       "write the whole of an EEPROM image, whatever is in it, as the "
+                       "library does, and read it back (`ostra eeprom write` is the safe way)");
     command.Add("FILE", options->file, "image of 8192 bytes").Required();
     AddInstrumentOptions(command, options->instrument);
     AddJsonFlag(command, options->json);

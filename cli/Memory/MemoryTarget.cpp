@@ -85,7 +85,7 @@ MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, U
         session, options.instrument,
         use == Use::Change ? Instrument::Choice::MustBeNamed : Instrument::Choice::FirstWillDo);
     name = instrument->Identifier();
-    image = use == Use::Change ? ReadEepromTwice(session, *instrument) : ReadEeprom(session, *instrument);
+    image = ReadEepromTwice(session, *instrument);
 }
 
 ToolFailure MemoryTarget::Unusable(const std::string& reason) const {

@@ -221,27 +221,6 @@ TEST_P(MemoryCommandsTest, AFailedWriteTellsTheWayBack) {
     EXPECT_GT(failures, 20);
 }
 
-TEST_P(MemoryCommandsTest, WhatReadsBackDifferentlyIsAFailure) {
-    WriteFile(image, Calibrated("5"));
-    // Readings 0 to 3 are two of the whole EEPROM before the write, 4 and 5 the one after it.
-    SetFaults("bulk-in 5:flip=100");
-    Fail({"eeprom", "write", image, "--backup", backup}, ExitCode::InputOutput, "reads back differently");
-    EXPECT_THAT(tool.Err(), HasSubstr("eeprom restore"));
-}
-
-TEST_P(MemoryCommandsTest, ABackupThatCannotBeTrustedIsNone) {
-    WriteFile(image, Calibrated("5"));
-    for (const int reading : {0, 1, 2, 3}) {
-        for (const Arguments& command : std::vector<Arguments>{{"eeprom", "write", image, "--backup", backup},
-                                                               {"eeprom", "backup", backup}}) {
-            SetFaults("bulk-in " + std::to_string(reading) + ":flip=9");
-            Fail(command, ExitCode::InputOutput, "two readings of the EEPROM differ");
-            ExpectUnchanged();
-            EXPECT_EQ(folder.Files(), std::vector<std::string>{"image"});
-        }
-    }
-}
-
 TEST_P(MemoryCommandsTest, CtrlCEndsAWriteBetweenTwoPieces) {
     EepromImage wanted = before;
     std::fill(wanted.begin() + 5000, wanted.end(), std::uint8_t{0x77});

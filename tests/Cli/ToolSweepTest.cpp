@@ -1,0 +1,274 @@
+// Every command that talks to an instrument, on both transports, with every fault at every transfer: it
+// succeeds with the result that it has without the fault, or it fails with its exit code, tells what to do,
+// and has lost nothing.
+#include <cstdio>
+#include <map>
+
+#include "Memory/ImageEdit.h"
+#include "Memory/ImageModel.h"
+#include "Protocol/PropertyIdentifiers.h"
+#include "ToolFixture.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using Cli::ExitCode;
+using Simulator::Fault;
+using Simulator::FaultKind;
+using Simulator::FaultPlan;
+using Simulator::FaultScope;
+using Bytes = std::vector<std::uint8_t>;
+using Files = std::map<std::string, Bytes>;
+
+constexpr std::uint32_t RecordSize = 5000;
+
+/// What the data of a command are protected by.
+enum class Data {
+    Checked,     ///< memory: read twice, and once more when it was written
+    Trusted,     ///< read or sent once, without a check that the instrument offers: wrong bytes are not seen
+    TrustedOpen  ///< of a scan, besides, that lasts until a transfer comes short
+};
+
+struct Command {
+    const char* name;
+    std::vector<std::string> arguments;  ///< "@NAME": a file in the test's folder
+    Data data;
+    const char* recording = nullptr;  ///< of records of `RecordSize` bytes
+    bool showsEvents = false;         ///< a removal is one, and a success
+};
+
+const std::vector<Command>& Commands() {
+    static const std::vector<Command> commands{
+        {"Identify", {"identify"}, Data::Trusted},
+        {"Reset", {"reset"}, Data::Trusted},
+        {"Readout", {"readout"}, Data::Trusted},
+        {"ReadoutInTime", {"readout", "--integration-time", "0.01"}, Data::Trusted},
+        {"Scan",
+         {"scan", "--record-size", "5000", "--records", "30", "--timeout", "1", "--raw", "-o", "@scan"},
+         Data::Trusted,
+         "scan"},
+        {"OpenScan",
+         {"scan", "--record-size", "5000", "--timeout", "1", "--raw", "-o", "@scan"},
+         Data::TrustedOpen,
+         "scan"},
+        {"Monitor", {"monitor", "--for", "0.1"}, Data::Trusted, nullptr, true},
+        {"Backup", {"eeprom", "backup", "@new"}, Data::Checked},
+        {"Show", {"eeprom", "show"}, Data::Checked},
+        {"Check", {"eeprom", "check"}, Data::Checked},
+        {"Diff", {"eeprom", "diff", "@image"}, Data::Checked},
+        {"Write", {"eeprom", "write", "@image", "--backup", "@backup"}, Data::Checked},
+        {"Restore", {"eeprom", "restore", "@image"}, Data::Checked},
+        {"WriteImage", {"write-image", "@image"}, Data::Checked},
+        {"CalibrationShow", {"calibration", "show"}, Data::Checked},
+        {"CalibrationSet", {"calibration", "set", "1211=5", "--backup", "@backup"}, Data::Checked},
+        {"LogShow", {"log", "show"}, Data::Checked},
+        {"LogReset", {"log", "reset", "--backup", "@backup"}, Data::Checked},
+        {"BinaryGet", {"binary", "get", "@new"}, Data::Checked},
+        {"BinaryPut", {"binary", "put", "@block", "--backup", "@backup"}, Data::Checked},
+        {"WordGet", {"word", "get", "10200"}, Data::Checked},
+        {"WordPut", {"word", "put", "10200=7", "--backup", "@backup"}, Data::Checked},
+        {"RamShow", {"ram", "show"}, Data::Trusted},
+        {"RamSet", {"ram", "set", "2009=0.02"}, Data::Trusted},
+    };
+    return commands;
+}
+
+/// The image that is written: the fresh one with a difference in several pieces.
+Bytes ImageToWrite() {
+    Bytes image = Cli::FreshImage();
+    for (std::uint16_t id = Protocol::PropertyIds::FirstRawWord; id < Cli::LastWritableRawWord; ++id) {
+        Cli::SetRawWord(image, id, 0xA5000000U + id);
+    }
+    image.back() ^= 0x55;
+    return image;
+}
+
+class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_t>> {
+  protected:
+    struct Result {
+        ExitCode code = ExitCode::Other;
+        std::string out, err;
+        Files filesBefore, files;
+        Bytes memoryBefore, memory;
+        std::uint32_t hits = 0;
+    };
+
+    const Transport transport = std::get<0>(GetParam());
+    const Command& command = Commands()[std::get<1>(GetParam())];
+
+    static Files FilesIn(const TestFolder& folder) {
+        Files files;
+        for (const std::string& name : folder.Files()) {
+            files[name] = ReadFile(folder.Path(name));
+        }
+        return files;
+    }
+
+    Result Run(const FaultPlan& plan) const {
+        const TestClock clock(TestTime::Virtual, 1);
+        SimulatedHost host(transport);
+        Simulator::InstrumentSettings settings;
+        settings.scanBytes = command.recording != nullptr ? 30 * RecordSize : Protocol::ReadoutBytes;
+        auto& instrument = host.Add("sim", settings);
+        const TestFolder folder;
+        WriteFile(folder.Path("image"), ImageToWrite());
+        WriteFile(folder.Path("block"), Bytes(Cli::BinaryBlockOf(ImageToWrite()).size(), 0x3C));
+        const auto script = host.Bus().SetFaults("sim", plan);
+        Arguments arguments;
+        for (const std::string& argument : command.arguments) {
+            arguments.push_back(argument.starts_with('@') ? folder.Path(argument.substr(1)) : argument);
+        }
+
+        Result result;
+        result.filesBefore = FilesIn(folder);
+        result.memoryBefore = instrument.Eeprom();
+        ToolRunner tool;
+        const Stopwatch stopwatch(clock);
+        result.code = tool.Run(arguments);
+        stopwatch.ExpectAtMost(90'000);
+        result.out = tool.Out();
+        result.err = tool.Err();
+        result.files = FilesIn(folder);
+        result.memory = instrument.Eeprom();
+        result.hits = script->Hits();
+        EXPECT_EQ(instrument.PendingTransfers(), 0U);
+        EXPECT_FALSE(instrument.Claimed());
+        return result;
+    }
+
+    /// Wrong bytes in the place of others, and the end of a scan that has no other end, cannot be told from
+    /// right ones where nothing protects them.
+    bool IsLeftOut(const Fault& fault) const {
+        const bool isWrongData = fault.kind == FaultKind::Flip || fault.kind == FaultKind::Garbage ||
+                                 fault.kind == FaultKind::Stale;
+        const bool isEnd = fault.scope == FaultScope::BulkIn &&
+                           (fault.kind == FaultKind::Short || fault.kind == FaultKind::Empty);
+        // What is sent to an instrument it takes as a whole, so that a driver need not say how much went.
+        const bool isUntold = transport == Transport::Native && fault.scope == FaultScope::Control &&
+                              fault.kind == FaultKind::Empty;
+        const bool isTrusted = command.data != Data::Checked &&
+                               (isWrongData || (isEnd && command.data == Data::TrustedOpen) || isUntold);
+        // A transfer that reaches a pipe late lets the one behind it take its data: no real one does.
+        const bool isOvertaken = command.recording != nullptr && fault.scope == FaultScope::BulkIn &&
+                                 fault.kind == FaultKind::Late;
+        // Whatever the interrupt pipe brings is a press of the button.
+        const bool isEvent =
+            command.showsEvents &&
+            (Unplugs(fault) || (fault.scope == FaultScope::Interrupt && fault.kind == FaultKind::Empty));
+        return isTrusted || isOvertaken || isEvent;
+    }
+
+    static bool Unplugs(const Fault& fault) {
+        return fault.kind == FaultKind::GoneBefore || fault.kind == FaultKind::GoneDuring ||
+               fault.kind == FaultKind::GoneAfter;
+    }
+
+    static std::vector<ExitCode> CodesOf(const Fault& fault) {
+        if (fault.scope == FaultScope::Control && !Unplugs(fault)) {
+            // What an instrument has not understood it does not answer.
+            return {ExitCode::InputOutput, ExitCode::Timeout};
+        }
+        switch (fault.kind) {
+            case FaultKind::GoneBefore:
+            case FaultKind::GoneDuring:
+            case FaultKind::GoneAfter:
+                return {ExitCode::NoInstrument};
+            case FaultKind::Silent:
+            case FaultKind::LateCancel:
+                return {ExitCode::Timeout};
+            case FaultKind::Late:
+                return {};
+            default:
+                return {ExitCode::InputOutput};
+        }
+    }
+
+    void ExpectNothingLost(const Result& result, const Result& undisturbed) const {
+        for (const auto& [name, content] : result.filesBefore) {
+            ASSERT_TRUE(result.files.contains(name)) << name;
+            EXPECT_EQ(result.files.at(name), content) << name;
+        }
+        for (const auto& [name, content] : result.files) {
+            if (name == "backup") {
+                EXPECT_EQ(content, result.memoryBefore) << "the backup is not what was there";
+            } else if (command.recording != nullptr && name == command.recording) {
+                const Bytes& all = undisturbed.files.at(name);
+                EXPECT_GT(content.size(), 0U);
+                EXPECT_EQ(content.size() % RecordSize, 0U);
+                EXPECT_LE(content.size(), all.size());
+                EXPECT_TRUE(std::equal(content.begin(), content.end(), all.begin()));
+            } else {
+                ASSERT_TRUE(undisturbed.files.contains(name)) << name << " was left behind";
+                EXPECT_EQ(content, undisturbed.files.at(name)) << name;
+            }
+        }
+        if (result.memory != result.memoryBefore) {
+            const bool hasBackup = undisturbed.files.contains("backup");
+            EXPECT_EQ(result.files.contains("backup"), hasBackup);
+            EXPECT_THAT(result.err,
+                        testing::ContainsRegex(hasBackup ? "ostra eeprom restore" : "again|once more"));
+        }
+    }
+
+    void Check(const Fault& fault, const Result& result, const Result& undisturbed) const {
+        SCOPED_TRACE(Simulator::ToText(fault) + "\n" + result.err);
+        if (result.code == undisturbed.code) {
+            EXPECT_EQ(result.out, undisturbed.out);
+            EXPECT_EQ(result.files, undisturbed.files);
+            EXPECT_EQ(result.memory, undisturbed.memory);
+            return;
+        }
+        EXPECT_THAT(CodesOf(fault), testing::Contains(result.code));
+        EXPECT_THAT(result.err, testing::HasSubstr("ostra: "));
+        EXPECT_THAT(result.err, testing::HasSubstr("\n       ")) << "no advice";
+        ExpectNothingLost(result, undisturbed);
+    }
+};
+
+TEST_P(ToolSweep, SucceedsWholeOrFailsWithNothingLost) {
+    const Result undisturbed = Run({});
+    ASSERT_TRUE(undisturbed.code == ExitCode::Success || undisturbed.code == ExitCode::Different)
+        << undisturbed.err;
+    int cases = 0, leftOut = 0, ran = 0;
+    for (const FaultScope scope :
+         {FaultScope::Control, FaultScope::BulkIn, FaultScope::BulkOut, FaultScope::Interrupt}) {
+        bool isHit = true;
+        for (std::uint32_t index = 0; isHit && !HasFailure(); ++index) {
+            isHit = false;
+            for (const auto& name : Simulator::AllFaults()) {
+                Fault fault{scope, index, false, name.kind, {}};
+                if (name.kind == FaultKind::Late) {
+                    fault.argument = 20;
+                }
+                if (IsLeftOut(fault)) {
+                    ++leftOut;
+                    continue;
+                }
+                // A build that checks memory takes its time: it tries some of them.
+                if (++ran % OSTRA_SWEEP_STEP != 0 && isHit) {
+                    continue;
+                }
+                const Result result = Run(FaultPlan({fault}));
+                isHit = isHit || result.hits > 0;
+                if (result.hits > 0) {
+                    ++cases;
+                    Check(fault, result, undisturbed);
+                }
+            }
+        }
+    }
+    EXPECT_GT(cases, 0);
+    std::printf("%d cases, %d left out\n", cases, leftOut);
+    RecordProperty("cases", cases);
+}
+
+INSTANTIATE_TEST_SUITE_P(All, ToolSweep,
+                         testing::Combine(testing::Values(Transport::Native, Transport::UsbIo),
+                                          testing::Range<std::size_t>(0, Commands().size())),
+                         [](const auto& parameter) {
+                             return std::string(Name(std::get<0>(parameter.param))) + "_" +
+                                    Commands()[std::get<1>(parameter.param)].name;
+                         });
+
+}  // namespace
+}  // namespace Varnholt::Tests
