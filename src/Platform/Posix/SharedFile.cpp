@@ -19,7 +19,6 @@
 namespace Varnholt::Platform::Posix {
 namespace {
 
-constexpr char Directory[] = "/dev/shm";
 constexpr std::size_t LongestEscapedName = 180;
 constexpr std::size_t KeptOfLongName = 120;
 /// Each attempt but the last met a process that was just letting go of the file, or just making it.
@@ -75,8 +74,8 @@ class SharedFile::OpenFile final {
 
     /// Once; false with the reason in `errno`. The object is there before the file is, so that no failure
     /// comes between the two.
-    bool Open(const char* path, int flags, mode_t mode = 0) {
-        descriptor = open(path, flags, mode);
+    bool Open(const UserDirectory& directory, const char* name, int flags, mode_t mode = 0) {
+        descriptor = openat(directory.Descriptor(), name, flags, mode);
         return descriptor >= 0;
     }
     int Get() const { return descriptor; }
@@ -118,9 +117,10 @@ struct SharedFile::Attempts {
 
     /// Makes the file without a name, fills it, and then gives it its name if nobody has taken that
     /// meanwhile.
-    static Attempt Make(const std::string& path, const SharedFile::Content& content) {
+    static Attempt Make(const UserDirectory& directory, const std::string& name,
+                        const SharedFile::Content& content) {
         auto file = std::make_unique<OpenFile>();
-        if (!file->Open(Directory, O_TMPFILE | O_RDWR | O_CLOEXEC, S_IRUSR | S_IWUSR) ||
+        if (!file->Open(directory, ".", O_TMPFILE | O_RDWR | O_CLOEXEC, S_IRUSR | S_IWUSR) ||
             ftruncate(file->Get(), static_cast<off_t>(content.size)) != 0 || !file->Map(content.size) ||
             flock(file->Get(), LOCK_SH | LOCK_NB) != 0) {
             return Fail(CodeOf(errno));
@@ -129,20 +129,21 @@ struct SharedFile::Attempts {
             return Fail(Errors::NoSystemResources);
         }
         const std::string unnamed = "/proc/self/fd/" + std::to_string(file->Get());
-        if (linkat(AT_FDCWD, unnamed.c_str(), AT_FDCWD, path.c_str(), AT_SYMLINK_FOLLOW) != 0) {
+        if (linkat(AT_FDCWD, unnamed.c_str(), directory.Descriptor(), name.c_str(), AT_SYMLINK_FOLLOW) != 0) {
             return errno == EEXIST ? Attempt() : Fail(CodeOf(errno));
         }
         return file;
     }
 
     /// Opens what another process has made.
-    static Attempt Join(OpenFilePtr file, const std::string& path, const SharedFile::Content& content) {
+    static Attempt Join(OpenFilePtr file, const UserDirectory& directory, const std::string& name,
+                        const SharedFile::Content& content) {
         struct stat state {};
         if (fstat(file->Get(), &state) != 0) {
             return Fail(CodeOf(errno));
         }
         if (!S_ISREG(state.st_mode) || state.st_uid != geteuid()) {
-            // Also for who could open it: its owner may write anything into it.
+            // Such as root could have put there: its owner may write anything into it.
             return Fail(Errors::AccessDenied);
         }
         if (flock(file->Get(), LOCK_SH | LOCK_NB) != 0) {
@@ -161,34 +162,40 @@ struct SharedFile::Attempts {
             }
         }
         // Nothing of ours. Without users it only bars the way.
-        if (flock(file->Get(), LOCK_EX | LOCK_NB) == 0 && unlink(path.c_str()) == 0) {
+        if (flock(file->Get(), LOCK_EX | LOCK_NB) == 0 &&
+            unlinkat(directory.Descriptor(), name.c_str(), 0) == 0) {
             return Attempt();
         }
         return Fail(Errors::InvalidData);
     }
 
-    static Attempt OpenOrMake(const std::string& path, const SharedFile::Content& content) {
-        // Not to be kept waiting by a named pipe either, and no link to be followed: the directory is
-        // everybody's.
+    static Attempt OpenOrMake(const UserDirectory& directory, const std::string& name,
+                              const SharedFile::Content& content) {
+        // Not to be kept waiting by a named pipe either, and no link to be followed.
         auto file = std::make_unique<OpenFile>();
-        if (file->Open(path.c_str(), O_RDWR | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC)) {
-            return Join(std::move(file), path, content);
+        if (file->Open(directory, name.c_str(), O_RDWR | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC)) {
+            return Join(std::move(file), directory, name, content);
         }
-        return errno == ENOENT ? Make(path, content) : Fail(CodeOf(errno));
+        return errno == ENOENT ? Make(directory, name, content) : Fail(CodeOf(errno));
     }
 };
 
-SharedFile::SharedFile(std::string openedPath, std::unique_ptr<OpenFile> opened)
-    : path(std::move(openedPath)), file(std::move(opened)) {}
+SharedFile::SharedFile(std::unique_ptr<UserDirectory> usersDirectory, std::string fileName,
+                       std::unique_ptr<OpenFile> opened)
+    : directory(std::move(usersDirectory)), name(std::move(fileName)), file(std::move(opened)) {}
 
 std::unique_ptr<SharedFile> SharedFile::Open(const std::string& kind, const std::string& name,
                                              const Content& content) {
-    std::string path = PathOf(kind, name);
+    auto directory = UserDirectory::Open();
+    if (!directory) {
+        return nullptr;
+    }
+    std::string fileName = FileNameOf(kind, name);
     for (int count = 0; count < MostAttempts; ++count) {
-        if (Attempts::Attempt attempt = Attempts::OpenOrMake(path, content)) {
-            return *attempt
-                       ? std::unique_ptr<SharedFile>(new SharedFile(std::move(path), std::move(*attempt)))
-                       : nullptr;
+        if (Attempts::Attempt attempt = Attempts::OpenOrMake(*directory, fileName, content)) {
+            return *attempt ? std::unique_ptr<SharedFile>(new SharedFile(
+                                  std::move(directory), std::move(fileName), std::move(*attempt)))
+                            : nullptr;
         }
         if (count > AttemptsWithoutPause) {
             usleep(PauseBetweenAttempts);
@@ -205,7 +212,7 @@ SharedFile::~SharedFile() {
     }
     struct stat state {};
     if (fstat(file->Get(), &state) == 0 && state.st_nlink > 0) {
-        unlink(path.c_str());
+        unlinkat(directory->Descriptor(), name.c_str(), 0);
     }
 }
 
@@ -213,12 +220,12 @@ void* SharedFile::Memory() const {
     return file->Memory();
 }
 
-std::string SharedFile::PathOf(const std::string& kind, const std::string& name) {
+std::string SharedFile::FileNameOf(const std::string& kind, const std::string& name) {
     std::string escaped = Escaped(name);
     if (escaped.size() > LongestEscapedName) {
         escaped = escaped.substr(0, KeptOfLongName) + "." + Hash(name);
     }
-    return std::string(Directory) + "/ostra." + kind + "." + escaped;
+    return kind + "." + escaped;
 }
 
 }  // namespace Varnholt::Platform::Posix

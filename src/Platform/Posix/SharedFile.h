@@ -4,10 +4,12 @@
 #include <memory>
 #include <string>
 
+#include "Platform/Posix/UserDirectory.h"
+
 namespace Varnholt::Platform::Posix {
 
-/// Memory that every process of one user that opens the same name shares; a file in the machine's shared
-/// memory that is there while somebody has it open.
+/// Memory that every process of one user that opens the same name shares; a file in the user's directory that
+/// is there while somebody has it open.
 ///
 /// A file appears under its name complete, and goes with the last that lets go of it: users hold a shared
 /// lock on it, and who can turn his own into an exclusive one is the last. A newcomer who locked a file that
@@ -23,8 +25,8 @@ class SharedFile final {
         const void* argument;
     };
 
-    /// Null on failure with the reason in `LastError`: `Errors::AccessDenied` for a file of another user,
-    /// `Errors::InvalidData` for one that is in use with other content. `kind` is a short word.
+    /// Null on failure with the reason in `LastError`: `Errors::InvalidData` for a file that is in use
+    /// with other content. `kind` is a short word.
     static std::unique_ptr<SharedFile> Open(const std::string& kind, const std::string& name,
                                             const Content& content);
 
@@ -34,16 +36,18 @@ class SharedFile final {
 
     void* Memory() const;
 
-    /// The path of a name's file: the name with its unusual characters escaped, or shortened to its beginning
-    /// and a hash.
-    static std::string PathOf(const std::string& kind, const std::string& name);
+    /// A name's file in the directory: the name with its unusual characters escaped, or shortened to its
+    /// beginning and a hash.
+    static std::string FileNameOf(const std::string& kind, const std::string& name);
 
   private:
     class OpenFile;
     struct Attempts;
-    SharedFile(std::string openedPath, std::unique_ptr<OpenFile> opened);
+    SharedFile(std::unique_ptr<UserDirectory> usersDirectory, std::string fileName,
+               std::unique_ptr<OpenFile> opened);
 
-    const std::string path;
+    const std::unique_ptr<UserDirectory> directory;
+    const std::string name;
     const std::unique_ptr<OpenFile> file;
 };
 

@@ -19,6 +19,11 @@ namespace Varnholt::Platform {
 namespace {
 
 using Posix::SharedFile;
+using Posix::UserDirectory;
+
+std::string PathOf(const std::string& name) {
+    return UserDirectory::Open()->Path() + "/" + SharedFile::FileNameOf("mutex", name);
+}
 
 /// A name whose file the test may tamper with.
 class SharedFiles : public testing::Test {
@@ -26,7 +31,7 @@ class SharedFiles : public testing::Test {
     void TearDown() override { std::filesystem::remove(path); }
 
     const std::string name = UniqueName("tampered");
-    const std::string path = SharedFile::PathOf("mutex", name);
+    const std::string path = PathOf(name);
 };
 
 bool CanBeUsed(const OwnedHandle& mutex) {
@@ -58,7 +63,7 @@ TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
         {"garbage of the same size",
          [](const std::string& file) {
              const OwnedHandle mutex(MakeMutex(UniqueName("size")));
-             const auto size = std::filesystem::file_size(SharedFile::PathOf("mutex", UniqueName("size")));
+             const auto size = std::filesystem::file_size(PathOf(UniqueName("size")));
              std::ofstream(file) << std::string(size, '\x5A');
          }},
     };
@@ -141,14 +146,14 @@ TEST(SharedFileNames, AreFileNamesOfBoundedLengthAndDiffer) {
                                  std::string(500, '/'),
                                  std::string(500, '/') + "a",
                                  std::string(500, '/') + "b"};
-    std::set<std::string> paths;
+    std::set<std::string> fileNames;
     for (const std::string& name : names) {
-        const std::filesystem::path path = SharedFile::PathOf("mutex", name);
-        EXPECT_EQ(path.parent_path(), "/dev/shm");
-        EXPECT_LE(path.filename().string().size(), 200u);
-        EXPECT_TRUE(paths.insert(path).second) << path;
+        const std::string fileName = SharedFile::FileNameOf("mutex", name);
+        EXPECT_EQ(fileName.find('/'), std::string::npos) << fileName;
+        EXPECT_LE(fileName.size(), 200u);
+        EXPECT_TRUE(fileNames.insert(fileName).second) << fileName;
     }
-    EXPECT_NE(SharedFile::PathOf("mutex", "a"), SharedFile::PathOf("semaphore", "a"));
+    EXPECT_NE(SharedFile::FileNameOf("mutex", "a"), SharedFile::FileNameOf("semaphore", "a"));
 }
 
 }  // namespace
