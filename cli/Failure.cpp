@@ -5,6 +5,7 @@
 #include <array>
 #include <ios>
 #include <new>
+#include <string_view>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Platform/ErrorCodes.h"
@@ -52,6 +53,9 @@ const std::array Meanings{
     CodeMeaning{BusTimeout, ExitCode::Timeout, SilentMessage, SilentAdvice},
 };
 
+/// The library's text for a lock that the system did not make.
+constexpr std::string_view MissingLockText = "handle is NULL";
+
 std::string Tidy(std::string text) {
     // A Windows system text ends with a line break of its own.
     for (std::size_t at = 0; (at = text.find_first_of("\r\n", at)) != std::string::npos;) {
@@ -98,6 +102,11 @@ FailureReport Describe(const std::exception_ptr& failure) {
         return {ExitCode::BadData, Tidy(exception.what()), {}};
     } catch (const IOException& exception) {
         return OfTransfer(exception);
+    } catch (const Utilities::Exceptions::InvalidArgumentException& exception) {
+        // The library's text does not say why; the code is still that of the failure.
+        const std::string text = Tidy(exception.what());
+        return text == MissingLockText ? DescribeMissingLock(Platform::LastError())
+                                       : FailureReport{ExitCode::Other, text, {}};
     } catch (const Utilities::Exceptions::TraceableException& exception) {
         return {ExitCode::Other, Tidy(exception.what()), {}};
     } catch (const std::bad_alloc&) {

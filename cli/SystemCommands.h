@@ -4,6 +4,8 @@
 #include <string>
 
 #include "CommandSpec.h"
+#include "Failure.h"
+#include "Platform/ErrorCodes.h"
 
 namespace Varnholt::Cli {
 
@@ -18,6 +20,9 @@ extern const char* const NoneIsFound;
 extern const char* const NoPermission;
 extern const char* const TransferFailed;
 }  // namespace SystemAdvice
+
+/// Why the system refuses the lock of an instrument, and what to do: `code` is what `MakeMutex` left.
+FailureReport DescribeMissingLock(Platform::ErrorCode code);
 
 /// Prints the devices that could be instruments, as a table or JSON (--candidates of the list command).
 void PrintCandidates(Session& session, bool json);

@@ -1,3 +1,5 @@
+#include <fmt/format.h>
+
 #include "Failure.h"
 #include "SystemCommands.h"
 
@@ -8,6 +10,14 @@ const char* const NoneIsFound = "the device manager shows whether it is plugged 
 const char* const NoPermission = "end other programs that use it, or ask an administrator";
 const char* const TransferFailed = "try again; if it stays, unplug the instrument and plug it in again";
 }  // namespace SystemAdvice
+
+FailureReport DescribeMissingLock(Platform::ErrorCode code) {
+    return {ExitCode::NotAvailable,
+            fmt::format("the instrument's lock cannot be had: Windows error {}, {}", code,
+                        Platform::ErrorText(code)),
+            code == Platform::Errors::AccessDenied ? "another user's program has it: end that program"
+                                                   : "try again; if it stays, restart Windows"};
+}
 
 void AddSystemCommands(CommandSpec, Session&) {}
 

@@ -2,8 +2,9 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
-#include "Linux/Diagnosis.h"
+#include "Finding.h"
 #include "Output/Json.h"
+#include "Session.h"
 
 namespace Varnholt::Cli {
 namespace {

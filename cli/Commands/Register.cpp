@@ -1,4 +1,5 @@
 #include <fmt/format.h>
+#include <grp.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -64,6 +65,16 @@ void ApplyRules(Session& session) {
     }
 }
 
+/// udev passes over a group that it does not know.
+void WarnOfMissingGroup(Session& session, const Options& options) {
+    if (getgrnam(InstrumentGroup) == nullptr) {
+        session.Warn(fmt::format(
+            "there is no group {0}, so only the user at the seat has access; for others: sudo groupadd "
+            "--system {0}, then sudo ostra register {1}",
+            InstrumentGroup, options.id));
+    }
+}
+
 void Register(Session& session, const Options& options) {
     const UsbId id = ParseUsbId(options.id);
     const std::string before = RulesIn(options.file);
@@ -93,6 +104,9 @@ void Register(Session& session, const Options& options) {
     ChangeRules(options, after);
     if (options.file == UdevRuleFile) {
         ApplyRules(session);
+        if (!options.remove) {
+            WarnOfMissingGroup(session, options);
+        }
     }
     if (options.json) {
         session.Print({{"file", options.file}, {"changed", true}, {"content", after}});

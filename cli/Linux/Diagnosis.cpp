@@ -1,12 +1,20 @@
 #include "Linux/Diagnosis.h"
 
 #include <fmt/format.h>
+#include <grp.h>
+#include <pwd.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <filesystem>
 
 #include "Instrument.h"
+#include "Linux/SharedMemory.h"
+#include "Linux/UdevRule.h"
 #include "Platform/Usb/SimulatorAddress.h"
+#include "Session.h"
+#include "Utilities/Tools/Win32/SystemHelperWin.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -15,6 +23,9 @@ using Level = Finding::Level;
 using Platform::Usb::UsbDeviceInfo;
 
 constexpr const char* Replug = "unplug it and plug it in again";
+constexpr const char* GiveItUsb =
+    "in a container: pass it the host's /dev/bus/usb and /run/udev; in WSL: `usbipd attach` on Windows; in a "
+    "virtual machine: add a USB controller; or start ostra-simulator in another terminal";
 constexpr const char* EndTheOther = "end that program, or wait until it is done";
 /// The kernel's name for programs that drive a device themselves.
 constexpr const char* ProgramAsDriver = "usbfs";
@@ -24,19 +35,38 @@ std::string NameOf(const UsbDeviceInfo& device) {
     return fmt::format("{} ({}:{}{})", device.name, device.vendorId, device.productId, product);
 }
 
-Finding JudgeAnswer(const std::string& subject, const Answer& answer) {
-    if (!answer.failure) {
-        return {Level::Good, subject, fmt::format("answers (firmware {})", answer.firmware), ""};
+std::string WhoMayUse(const DeviceFacts& device, const GroupFacts& group) {
+    if (device.group != InstrumentGroup || group.isMemberHere) {
+        return {};
     }
-    const FailureReport& failure = *answer.failure;
-    return {Level::Problem, subject, "does not answer: " + failure.message,
-            failure.advice.empty()
-                ? std::string(Replug) + "; if that does not help, its firmware does not run"
-                : failure.advice,
-            failure.code};
+    return fmt::format(": members of the group {} may use it, and {} {}", InstrumentGroup, group.user,
+                       group.isMember ? "is one only from the next login on" : "is none");
 }
 
-void JudgeDevice(const DeviceFacts& facts, const Trial& trial, std::vector<Finding>& findings) {
+/// How the user comes to be allowed to use a device.
+std::string WayToPermission(const DeviceFacts& device, const GroupFacts& group) {
+    std::string steps;
+    const auto add = [&steps](const std::string& step) { steps += (steps.empty() ? "" : "; ") + step; };
+    if (!group.exists) {
+        add(fmt::format("sudo groupadd --system {}", InstrumentGroup));
+    }
+    if (device.group != InstrumentGroup) {
+        add(fmt::format("sudo ostra register {}:{}", device.info.vendorId, device.info.productId));
+    }
+    if (!group.isMember) {
+        add(fmt::format("sudo usermod -aG {} {}, then log in again", InstrumentGroup, group.user));
+    } else if (!group.isMemberHere) {
+        add(fmt::format("log in again: this session began before {} was a member", group.user));
+    }
+    if (steps.empty()) {
+        return fmt::format("{}; a container must be given the device by whoever starts it", Replug);
+    }
+    return fmt::format("log in at this machine's own seat, or use it as a member of the group {}: {}",
+                       InstrumentGroup, steps);
+}
+
+void JudgeDevice(const DeviceFacts& facts, const GroupFacts& group, const Trial& trial,
+                 std::vector<Finding>& findings) {
     const UsbDeviceInfo& device = facts.info;
     const std::string subject = NameOf(device);
     const std::string id = device.vendorId + ":" + device.productId;
@@ -52,13 +82,9 @@ void JudgeDevice(const DeviceFacts& facts, const Trial& trial, std::vector<Findi
         return;
     }
     if (!facts.isAccessible) {
-        findings.push_back(
-            {Level::Problem, subject, "no permission on " + device.deviceNode,
-             fmt::format(
-                 "log in at this machine's own seat, or run as root; `sudo ostra register {}` applies "
-                 "the rule anew, then {}",
-                 id, Replug),
-             ExitCode::NotAvailable});
+        findings.push_back({Level::Problem, subject,
+                            "no permission on " + device.deviceNode + WhoMayUse(facts, group),
+                            WayToPermission(facts, group), ExitCode::NotAvailable});
         return;
     }
     if (!facts.holders.empty()) {
@@ -106,20 +132,56 @@ Finding JudgeSimulator(const Platform::Usb::SimulatorInfo& simulator, const Tria
     return JudgeAnswer(simulator.name, trial(simulator.name));
 }
 
+std::string UserName() {
+    const passwd* const user = getpwuid(geteuid());
+    return user == nullptr ? std::to_string(geteuid()) : user->pw_name;
+}
+
+GroupFacts LookAtGroup() {
+    GroupFacts facts{.user = UserName()};
+    const group* const found = getgrnam(InstrumentGroup);
+    facts.exists = found != nullptr;
+    if (found == nullptr) {
+        return facts;
+    }
+    facts.isMemberHere = getegid() == found->gr_gid || group_member(found->gr_gid) != 0;
+    facts.isMember = facts.isMemberHere;
+    for (char** member = found->gr_mem; *member != nullptr; ++member) {
+        facts.isMember = facts.isMember || facts.user == *member;
+    }
+    return facts;
+}
+
+/// The group whose members may read and write the file; empty: none.
+std::string GroupOf(const std::string& file) {
+    struct stat state {};
+    constexpr mode_t readAndWrite = S_IRGRP | S_IWGRP;
+    if (stat(file.c_str(), &state) != 0 || (state.st_mode & readAndWrite) != readAndWrite) {
+        return {};
+    }
+    const group* const owner = getgrgid(state.st_gid);
+    return owner == nullptr ? "" : owner->gr_name;
+}
+
 MachineFacts LookAround() {
     MachineFacts facts;
     for (const UsbDeviceInfo& device : Platform::Usb::ListCandidateDevices()) {
         facts.devices.push_back({device, true, access(device.deviceNode.c_str(), R_OK | W_OK) == 0,
-                                 Platform::Usb::FindHolders(device.deviceNode)});
+                                 GroupOf(device.deviceNode), Platform::Usb::FindHolders(device.deviceNode)});
     }
     for (const UsbDeviceInfo& device : Platform::Usb::ListRegisteredDevices()) {
         const bool isCandidate = std::ranges::any_of(
             facts.devices, [&](const DeviceFacts& known) { return known.info.name == device.name; });
         if (!isCandidate) {
-            facts.devices.push_back({device, false, true, {}});
+            facts.devices.push_back({.info = device, .hasEndpoints = false});
         }
     }
     facts.simulators = Platform::Usb::ListSimulators();
+    std::error_code ignored;
+    facts.hasUsb = std::filesystem::exists("/sys/bus/usb", ignored);
+    facts.group = LookAtGroup();
+    facts.missingLock = TryLocks();
+    facts.needsLock = !Utilities::Tools::Is64BitOS();
     return facts;
 }
 
@@ -129,19 +191,7 @@ Answer Try(Session& session, const std::string& shortName) {
     if (listed == connected.end()) {
         return {0, FailureReport{ExitCode::NoInstrument, "the library does not list it", Replug}};
     }
-    try {
-        Instrument instrument(session, {*listed, ""});
-        std::uint8_t m1 = 0, m3 = 0;
-        std::uint16_t m2 = 0, m4 = 0, m5 = 0;
-        instrument.Commands().GetMISC(m1, m2, m3, m4, m5);
-        return {m2, std::nullopt};
-    } catch (...) {
-        FailureReport failure = session.Explain(std::current_exception());
-        if (failure.message.starts_with(*listed + ": ")) {
-            failure.message.erase(0, listed->size() + 2);  // a finding begins with its subject
-        }
-        return {0, failure};
-    }
+    return TryInstrument(session, *listed);
 }
 
 }  // namespace
@@ -149,17 +199,29 @@ Answer Try(Session& session, const std::string& shortName) {
 std::vector<Finding> Judge(const MachineFacts& facts, const Trial& trial) {
     std::vector<Finding> findings;
     for (const DeviceFacts& device : facts.devices) {
-        JudgeDevice(device, trial, findings);
+        JudgeDevice(device, facts.group, trial, findings);
     }
     for (const auto& simulator : facts.simulators) {
         findings.push_back(JudgeSimulator(simulator, trial));
     }
-    if (std::ranges::none_of(findings, [](const Finding& finding) { return finding.level != Level::Note; })) {
+    const bool isAnythingThere =
+        std::ranges::any_of(findings, [](const Finding& finding) { return finding.level != Level::Note; });
+    if (!facts.hasUsb) {
+        findings.push_back({isAnythingThere ? Level::Note : Level::Problem, "",
+                            "this machine has no USB (there is no /sys/bus/usb)", GiveItUsb,
+                            isAnythingThere ? ExitCode::Success : ExitCode::NoInstrument});
+    } else if (!isAnythingThere) {
         findings.push_back(
             {Level::Problem, "", "no USB device with the instrument's endpoints is plugged in",
              "plug the instrument in and look at its cable and hub, or start ostra-simulator in another "
              "terminal",
              ExitCode::NoInstrument});
+    }
+    if (facts.missingLock) {
+        const FailureReport& missing = *facts.missingLock;
+        findings.push_back({facts.needsLock ? Level::Problem : Level::Note, "",
+                            missing.message + (facts.needsLock ? "" : "; the transport native needs it"),
+                            missing.advice, facts.needsLock ? missing.code : ExitCode::Success});
     }
     return findings;
 }

@@ -6,6 +6,7 @@
 #include <cctype>
 #include <regex>
 #include <sstream>
+#include <string_view>
 
 #include "Failure.h"
 #include "Platform/Usb/UdevBus.h"
@@ -13,7 +14,12 @@
 namespace Varnholt::Cli {
 namespace {
 
-const std::string Header =
+constexpr std::string_view Header =
+    "# Written by `ostra register`: these USB devices are measuring instruments.\n"
+    "# The library looks for the property; the tag gives the user at the seat access, the group its "
+    "members.\n";
+/// As versions before the group's wrote it.
+constexpr std::string_view OldHeader =
     "# Written by `ostra register`: these USB devices are measuring instruments.\n"
     "# The library looks for the property; the tag gives the user at the seat access.\n";
 
@@ -25,9 +31,14 @@ std::string Mark() {
     return fmt::format("ENV{{{}}}=\"1\"", Platform::Usb::InterfaceClassProperty);
 }
 
-std::string RuleFor(const UsbId& id) {
-    return fmt::format("SUBSYSTEM==\"usb\", ENV{{DEVTYPE}}==\"usb_device\", {}, {}, TAG+=\"uaccess\"\n",
+/// As versions before the group's wrote it.
+std::string OldRuleFor(const UsbId& id) {
+    return fmt::format("SUBSYSTEM==\"usb\", ENV{{DEVTYPE}}==\"usb_device\", {}, {}, TAG+=\"uaccess\"",
                        Match(id), Mark());
+}
+
+std::string RuleFor(const UsbId& id) {
+    return fmt::format("{}, MODE=\"0660\", GROUP=\"{}\"", OldRuleFor(id), InstrumentGroup);
 }
 
 /// Whatever else somebody has added to it by hand.
@@ -55,11 +66,22 @@ UsbId ParseUsbId(const std::string& text) {
 }
 
 std::string WithRule(const std::string& rules, const UsbId& id) {
-    if (!WithoutRule(rules, id).changed) {
-        const bool endsInLine = !rules.empty() && !rules.ends_with('\n');
-        return (rules.empty() ? Header : rules) + (endsInLine ? "\n" : "") + RuleFor(id);
+    std::string changed = rules.empty() ? std::string(Header) : rules;
+    if (changed.starts_with(OldHeader)) {
+        changed.replace(0, OldHeader.size(), Header);
     }
-    return rules;
+    if (!WithoutRule(rules, id).changed) {
+        return changed + (changed.ends_with('\n') ? "" : "\n") + RuleFor(id) + "\n";
+    }
+    std::string updated;
+    std::istringstream lines(changed);
+    for (std::string line; std::getline(lines, line);) {
+        updated += (line == OldRuleFor(id) ? RuleFor(id) : line) + "\n";
+    }
+    if (!changed.ends_with('\n')) {
+        updated.pop_back();
+    }
+    return updated;
 }
 
 RulesLeft WithoutRule(const std::string& rules, const UsbId& id) {
@@ -72,7 +94,7 @@ RulesLeft WithoutRule(const std::string& rules, const UsbId& id) {
             left.rules += line + "\n";
         }
     }
-    if (left.rules == Header) {
+    if (left.rules == Header || left.rules == OldHeader) {
         left.rules.clear();
     }
     return left;

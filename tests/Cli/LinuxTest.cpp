@@ -49,6 +49,14 @@ Diagnosis Usable(const char* name, const Cli::MachineFacts& facts, const std::ve
     return {name, facts, levels, "answers (firmware 301)", "", ExitCode::Success, 1};
 }
 
+/// A device that its group may use, and the user who may not.
+Cli::MachineFacts OfGroup(const char* group, const Cli::GroupFacts& user) {
+    auto device = Plugged();
+    device.isAccessible = false;
+    device.group = group;
+    return {.devices = {device}, .group = user};
+}
+
 std::vector<Diagnosis> Diagnoses() {
     auto locked = Plugged();
     locked.isAccessible = false;
@@ -66,6 +74,7 @@ std::vector<Diagnosis> Diagnoses() {
     simulatorOfAnother.usable = false;
     auto simulatorStopped = simulator;
     simulatorStopped.answers = false;
+    const Cli::FailureReport noLock{ExitCode::NotAvailable, "no lock there", "make room"};
     const std::vector problem{Level::Problem};
     const std::vector good{Level::Good};
     return {
@@ -88,6 +97,47 @@ std::vector<Diagnosis> Diagnoses() {
          "no permission on /dev/bus/usb/001/007",
          "log in at this machine's own seat",
          ExitCode::NotAvailable},
+        {"no permission, no member", OfGroup("plugdev", {"ann"}), problem,
+         "members of the group plugdev may use it, and ann is none",
+         "group plugdev: sudo usermod -aG plugdev ann, then log in again", ExitCode::NotAvailable},
+        {"no permission, not yet a member", OfGroup("plugdev", {"ann", true, true}), problem,
+         "ann is one only from the next login on", "group plugdev: log in again", ExitCode::NotAvailable},
+        {"no permission, an older version's rule", OfGroup("root", {"ann", true, true, true}), problem,
+         "no permission on /dev/bus/usb/001/007", "group plugdev: sudo ostra register 1209:0001",
+         ExitCode::NotAvailable},
+        {"no permission, no such group", OfGroup("", {"ann", false}), problem,
+         "no permission on /dev/bus/usb/001/007",
+         "sudo groupadd --system plugdev; sudo ostra register 1209:0001; sudo usermod -aG plugdev ann",
+         ExitCode::NotAvailable},
+        {"no permission for a member", OfGroup("plugdev", {"ann", true, true, true}), problem,
+         "no permission on /dev/bus/usb/001/007", "unplug it and plug it in again", ExitCode::NotAvailable},
+        {"no USB",
+         {.hasUsb = false},
+         problem,
+         "this machine has no USB",
+         "usbipd attach",
+         ExitCode::NoInstrument},
+        {"no USB, simulated",
+         {.simulators = {simulator}, .hasUsb = false},
+         {Level::Good, Level::Note},
+         "this machine has no USB",
+         "/dev/bus/usb",
+         ExitCode::Success,
+         1},
+        {"no lock",
+         {.devices = {Plugged()}, .missingLock = noLock},
+         {Level::Good, Level::Problem},
+         "no lock there",
+         "make room",
+         ExitCode::NotAvailable,
+         1},
+        {"no lock where none is needed",
+         {.devices = {Plugged()}, .missingLock = noLock, .needsLock = false},
+         {Level::Good, Level::Note},
+         "no lock there; the transport native needs it",
+         "make room",
+         ExitCode::Success,
+         1},
         {"held",
          {{held}, {}},
          problem,
@@ -201,7 +251,7 @@ TEST_F(RegisterTest, WritesARuleForEachKindOnce) {
     const auto rule = [](const std::string& vendor, const std::string& product) {
         return "SUBSYSTEM==\"usb\", ENV{DEVTYPE}==\"usb_device\", ATTR{idVendor}==\"" + vendor +
                "\", ATTR{idProduct}==\"" + product +
-               "\", ENV{OSTRA_INTERFACE_CLASS}=\"1\", TAG+=\"uaccess\"\n";
+               "\", ENV{OSTRA_INTERFACE_CLASS}=\"1\", TAG+=\"uaccess\", MODE=\"0660\", GROUP=\"plugdev\"\n";
     };
     const std::string rules = Rules();
     EXPECT_EQ(rules.substr(rules.find("SUBSYSTEM")), rule("1209", "00ab") + rule("04b4", "1003"));
@@ -210,7 +260,7 @@ TEST_F(RegisterTest, WritesARuleForEachKindOnce) {
 TEST_F(RegisterTest, LeavesOtherRulesAlone) {
     ASSERT_EQ(Register({"1209:0001"}), ExitCode::Success);
     std::string rules = Rules();
-    rules.insert(rules.size() - 1, ", MODE=\"0660\"");
+    rules.insert(rules.size() - 1, ", SYMLINK+=\"meter\"");
     const std::string others =
         "# mine\nSUBSYSTEM==\"tty\", MODE=\"0666\"\n # " + rules.substr(rules.find("SUBSYSTEM"));
     const auto both = rules + others;
@@ -220,6 +270,30 @@ TEST_F(RegisterTest, LeavesOtherRulesAlone) {
     EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success);
     EXPECT_EQ(Rules(), rules.substr(0, rules.find("SUBSYSTEM")) + others);
     EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::NoInstrument) << "a comment is no rule";
+}
+
+TEST_F(RegisterTest, KnowsTheRulesOfOlderVersions) {
+    const std::string header =
+        "# Written by `ostra register`: these USB devices are measuring instruments.\n"
+        "# The library looks for the property; the tag gives the user at the seat access.\n";
+    const auto rule = [](const char* product, const char* rest) {
+        return "SUBSYSTEM==\"usb\", ENV{DEVTYPE}==\"usb_device\", ATTR{idVendor}==\"1209\", "
+               "ATTR{idProduct}==\"" +
+               std::string(product) + "\", ENV{OSTRA_INTERFACE_CLASS}=\"1\", TAG+=\"uaccess\"" + rest + "\n";
+    };
+    constexpr const char* asNow = ", MODE=\"0660\", GROUP=\"plugdev\"";
+    const std::string two = header + rule("0001", "") + rule("0002", "");
+    std::filesystem::create_directories(std::filesystem::path(file).parent_path());
+    WriteFile(file, {two.begin(), two.end()});
+    ASSERT_EQ(Register({"1209:0002"}), ExitCode::Success) << tool.Err();
+    const std::string updated = Rules();
+    EXPECT_EQ(updated.substr(updated.find("SUBSYSTEM")), rule("0001", "") + rule("0002", asNow));
+    EXPECT_NE(updated.find("the group its members"), std::string::npos) << updated;
+
+    const std::string one = header + rule("0001", "");
+    WriteFile(file, {one.begin(), one.end()});
+    EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success) << tool.Err();
+    EXPECT_FALSE(std::filesystem::exists(file)) << Rules();
 }
 
 TEST_F(RegisterTest, TakesARegistrationBack) {
