@@ -1,22 +1,12 @@
 #include "Platform/Posix/SystemThread.h"
 
-#include <signal.h>
-
-#include <initializer_list>
+#include "Platform/Posix/HostSignalsBlocked.h"
 
 namespace Varnholt::Platform::Posix {
 
 bool StartSystemThread(pthread_t& thread, void* (*entry)(void*), void* argument) {
-    sigset_t blocked;
-    sigset_t before;
-    sigfillset(&blocked);
-    for (const int fault : {SIGSEGV, SIGBUS, SIGFPE, SIGILL, SIGABRT, SIGTRAP, SIGSYS}) {
-        sigdelset(&blocked, fault);
-    }
-    pthread_sigmask(SIG_SETMASK, &blocked, &before);
-    const bool started = pthread_create(&thread, nullptr, entry, argument) == 0;
-    pthread_sigmask(SIG_SETMASK, &before, nullptr);
-    return started;
+    const HostSignalsBlocked blocked;
+    return pthread_create(&thread, nullptr, entry, argument) == 0;
 }
 
 }  // namespace Varnholt::Platform::Posix

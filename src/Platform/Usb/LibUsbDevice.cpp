@@ -12,6 +12,7 @@
 #include <thread>
 #include <vector>
 
+#include "Platform/Posix/HostSignalsBlocked.h"
 #include "Platform/Usb/LibUsbErrors.h"
 #include "Platform/Usb/LibUsbEvents.h"
 #include "Protocol/Instrument.h"
@@ -261,7 +262,11 @@ std::shared_ptr<UsbDevice> OpenLibUsbDevice(const std::string& deviceNode, Error
         return nullptr;
     }
     libusb_context* context = nullptr;
-    int result = libusb_init(&context);
+    int result = LIBUSB_SUCCESS;
+    {
+        const Posix::HostSignalsBlocked blocked;  // libusb may start a thread
+        result = libusb_init(&context);
+    }
     if (result == LIBUSB_SUCCESS) {
         libusb_device_handle* handle = nullptr;
         result = libusb_wrap_sys_device(context, file, &handle);

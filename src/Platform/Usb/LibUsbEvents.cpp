@@ -1,10 +1,10 @@
 #include "Platform/Usb/LibUsbEvents.h"
 
 #include <libusb-1.0/libusb.h>
-#include <pthread.h>
-#include <signal.h>
 
 #include <algorithm>
+
+#include "Platform/Posix/HostSignalsBlocked.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
@@ -18,26 +18,10 @@ constexpr auto Patience = std::chrono::milliseconds(10);
 /// The longest stay in libusb; who waits comes back.
 constexpr auto LongestStay = std::chrono::seconds(60);
 
-/// Signals are the host program's business: its own threads take them.
-class SignalsBlocked final {
-  public:
-    SignalsBlocked() {
-        sigset_t all;
-        sigfillset(&all);
-        pthread_sigmask(SIG_SETMASK, &all, &before);
-    }
-    ~SignalsBlocked() { pthread_sigmask(SIG_SETMASK, &before, nullptr); }
-    SignalsBlocked(const SignalsBlocked&) = delete;
-    SignalsBlocked& operator=(const SignalsBlocked&) = delete;
-
-  private:
-    sigset_t before;
-};
-
 }  // namespace
 
 LibUsbEvents::LibUsbEvents(libusb_context* ownContext) : context(ownContext) {
-    const SignalsBlocked blocked;
+    const Posix::HostSignalsBlocked blocked;
     thread = std::thread([this] { RunThread(); });
 }
 

@@ -1,16 +1,14 @@
 #include "Platform/Usb/UsbIpDevice.h"
 
-#include <pthread.h>
-#include <signal.h>
-
 #include <algorithm>
 #include <condition_variable>
+#include <exception>
 #include <mutex>
 #include <new>
-#include <system_error>
 #include <thread>
 #include <utility>
 
+#include "Platform/Posix/HostSignalsBlocked.h"
 #include "Platform/Usb/UsbDescriptors.h"
 #include "Platform/Usb/UsbIpSocket.h"
 
@@ -140,20 +138,15 @@ ErrorCode UsbIpDevice::Claim() {
         connected = true;
         releaseLimit.reset();
     }
-    // Signals are the host program's business: its own threads take them.
-    sigset_t all;
-    sigset_t before;
-    sigfillset(&all);
-    pthread_sigmask(SIG_SETMASK, &all, &before);
     try {
+        const Posix::HostSignalsBlocked blocked;
         reader = std::thread([this] { Listen(); });
-    } catch (const std::system_error&) {
+    } catch (const std::exception&) {  // no thread, or no memory for it
         socket.reset();
         const std::lock_guard lock(mutex);
         connected = false;
         error = Errors::NoSystemResources;
     }
-    pthread_sigmask(SIG_SETMASK, &before, nullptr);
     return error;
 }
 

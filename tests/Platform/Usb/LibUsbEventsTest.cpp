@@ -8,6 +8,7 @@
 #include "Platform/Threads.h"
 #include "Platform/Usb/LibUsbEvents.h"
 #include "Platform/WaitableObjects.h"
+#include "Support/SignalMasks.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
@@ -46,6 +47,10 @@ class LibUsbEventsTest : public testing::Test {
     const OwnedHandle there{MakeAutoResetEvent()};
     const OwnedHandle back{MakeAutoResetEvent()};
 };
+
+TEST_F(LibUsbEventsTest, ItsThreadTakesNoSignalOfTheHost) {
+    Tests::ExpectOtherThreadsBlockHostSignals();
+}
 
 /// Each is in libusb, or about to go there, when the other wakes it.
 TEST_F(LibUsbEventsTest, ThreadsThatWakeEachOtherLoseNoSignal) {

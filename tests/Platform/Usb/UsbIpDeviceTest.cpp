@@ -17,6 +17,7 @@
 
 #include "Platform/Usb/UsbIpDevice.h"
 #include "Platform/Usb/UsbIpSocket.h"
+#include "Support/SignalMasks.h"
 #include "Support/TestTransfer.h"
 
 namespace Varnholt::Platform::Usb {
@@ -107,6 +108,11 @@ class UsbIpDeviceTest : public testing::Test {
 
     int peer = -1;
 };
+
+TEST_F(UsbIpDeviceTest, ItsThreadTakesNoSignalOfTheHost) {
+    const auto device = MakeClaimedDevice();
+    Tests::ExpectOtherThreadsBlockHostSignals();
+}
 
 TEST_F(UsbIpDeviceTest, ImportAndPacketsAreWhatTheProtocolSays) {
     const auto device = MakeDevice();

@@ -1,0 +1,20 @@
+#include "Platform/Posix/HostSignalsBlocked.h"
+
+#include <initializer_list>
+
+namespace Varnholt::Platform::Posix {
+
+HostSignalsBlocked::HostSignalsBlocked() {
+    sigset_t blocked;
+    sigfillset(&blocked);
+    for (const int fault : {SIGSEGV, SIGBUS, SIGFPE, SIGILL, SIGTRAP, SIGABRT, SIGSYS}) {
+        sigdelset(&blocked, fault);
+    }
+    pthread_sigmask(SIG_SETMASK, &blocked, &before);
+}
+
+HostSignalsBlocked::~HostSignalsBlocked() {
+    pthread_sigmask(SIG_SETMASK, &before, nullptr);
+}
+
+}  // namespace Varnholt::Platform::Posix
