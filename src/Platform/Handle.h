@@ -32,9 +32,11 @@ class OwnedHandle final {
 
     Handle Get() const { return handle; }
     explicit operator bool() const { return handle != NoHandle; }
+    /// The handle is the caller's from here on.
+    Handle Release() { return std::exchange(handle, NoHandle); }
     void Reset() {
         if (handle != NoHandle) {
-            Close(std::exchange(handle, NoHandle));
+            Close(Release());
         }
     }
 

@@ -1,6 +1,7 @@
 #include "Platform/InterruptibleDeviceFiles.h"
 
 #include <algorithm>
+#include <new>
 #include <utility>
 
 #include "Protocol/ByteOrder.h"
@@ -115,11 +116,18 @@ std::vector<std::string> InterruptibleDeviceFiles::ListInterfaces(const Protocol
 
 Handle InterruptibleDeviceFiles::Open(const std::string& path) {
     const Handle file = below.Open(path);
-    if (file != InvalidHandle()) {
+    if (file == InvalidHandle()) {
+        return file;
+    }
+    try {
         const CriticalSection::Holder holder(section);
         files.push_back({file, path});
+        return file;
+    } catch (const std::bad_alloc&) {
+        below.CloseFile(file);
+        SetLastError(Errors::NotEnoughMemory);
+        return InvalidHandle();
     }
-    return file;
 }
 
 bool InterruptibleDeviceFiles::CloseFile(Handle file) {
@@ -131,22 +139,22 @@ bool InterruptibleDeviceFiles::CloseFile(Handle file) {
     return below.CloseFile(file);
 }
 
-bool InterruptibleDeviceFiles::Refuse(Overlapped& record) const {
+bool InterruptibleDeviceFiles::Refuse(Overlapped& record, ErrorCode code) {
     record.internal = 0;
     record.internalHigh = 0;
     if (record.event != NoHandle) {
         SignalEvent(record.event);
     }
-    SetLastError(Errors::OperationAborted);
+    SetLastError(code);
     return false;
 }
 
 /// The section is held over the start, so that no transfer slips in behind an interruption.
 template <class Start>
-bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, bool isRead, Start start) {
+bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, bool isRead, Start start) try {
     const CriticalSection::Holder holder(section);
     if (interrupted) {
-        return Refuse(record);
+        return Refuse(record, Errors::OperationAborted);
     }
     std::erase_if(running, [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
     running.push_back({&record, file, isRead, std::this_thread::get_id()});
@@ -157,6 +165,8 @@ bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, bo
         SetLastError(code);
     }
     return completed;
+} catch (const std::bad_alloc&) {
+    return Refuse(record, Errors::NotEnoughMemory);
 }
 
 bool InterruptibleDeviceFiles::StartRead(Handle file, void* buffer, std::uint32_t length,
@@ -173,7 +183,7 @@ bool InterruptibleDeviceFiles::StartControl(Handle file, std::uint32_t code, con
                                             std::uint32_t inputSize, void* output, std::uint32_t outputSize,
                                             Overlapped& record) {
     // A control is short and has no pipe that could be aborted; it ends by itself.
-    return interrupted ? Refuse(record)
+    return interrupted ? Refuse(record, Errors::OperationAborted)
                        : below.StartControl(file, code, input, inputSize, output, outputSize, record);
 }
 

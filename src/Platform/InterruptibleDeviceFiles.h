@@ -64,7 +64,7 @@ class InterruptibleDeviceFiles final : public DeviceFileSystem {
 
     template <class Start>
     bool StartTransfer(Handle file, Overlapped& record, bool isRead, Start start);
-    bool Refuse(Overlapped& record) const;
+    static bool Refuse(Overlapped& record, ErrorCode code);
     void AbortPipe(Handle file);
     void Control(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize);
     const std::string& PathOf(Handle file) const;

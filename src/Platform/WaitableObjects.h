@@ -2,7 +2,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <memory>
 #include <span>
 #include <string>
 
@@ -48,7 +47,8 @@ WaitAnyResult WaitAny(std::span<const Handle> objects, std::uint32_t timeout);
 /// other object. `Failed` when `toSignal` cannot be signalled (then nothing was waited for).
 WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout);
 
-/// A process-local recursive lock; no handle, no time-out.
+/// A process-local recursive lock; no handle, no time-out. It takes no memory: neither making nor entering
+/// one can fail.
 class CriticalSection final {
   public:
     CriticalSection();
@@ -72,7 +72,11 @@ class CriticalSection final {
 
   private:
     struct Impl;
-    std::unique_ptr<Impl> impl;
+    Impl& Own();
+
+    /// Holds the platform's `Impl`.
+    static constexpr std::size_t ImplSize = 80;
+    alignas(void*) std::byte storage[ImplSize];
 };
 
 }  // namespace Varnholt::Platform

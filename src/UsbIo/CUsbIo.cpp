@@ -26,11 +26,14 @@ CUsbIo::~CUsbIo() {
     Close();
 }
 
-Platform::DeviceList CUsbIo::CreateDeviceList(const Protocol::Guid* interfaceGuid) {
+Platform::DeviceList CUsbIo::CreateDeviceList(const Protocol::Guid* interfaceGuid) try {
     if (!interfaceGuid || !DeviceInterfaces::Load()) {
         return nullptr;
     }
     return DeviceInterfaces::MakeList(*interfaceGuid, false);
+} catch (const std::bad_alloc&) {
+    Platform::SetLastError(Platform::Errors::NotEnoughMemory);
+    return nullptr;
 }
 
 bool CUsbIo::DestroyDeviceList(Platform::DeviceList list) {

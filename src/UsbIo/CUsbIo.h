@@ -16,11 +16,12 @@
 ///
 /// Operations report a 32-bit status: 0 is success, codes from 0xE0000000 on are the driver's or this
 /// library's (`Protocol::UsbIoDriver::Status`), others the platform's, passed through. Nothing is thrown,
-/// except `std::bad_alloc` by constructors. Times are milliseconds, `Platform::Infinite` for no limit.
+/// whatever memory there is. Times are milliseconds, `Platform::Infinite` for no limit.
 namespace Varnholt::UsbIo {
 
 /// A device of the USBIO driver. Device controls may come from several threads and are carried out one at a
-/// time; they wait without limit, because the driver completes each of them, also when the device is gone.
+/// time; they wait without a limit of their own, because the driver completes each of them, also when the
+/// device is gone, and on Linux after 5 s at the latest, with `TimedOut`.
 /// `Open` and `Close` belong to the owner and must not meet a device control of another thread.
 class CUsbIo {
   public:

@@ -4,123 +4,21 @@
 #include <gtest/gtest.h>
 
 #include <array>
-#include <atomic>
-#include <cstdlib>
-#include <new>
+#include <cstdio>
 #include <vector>
 
 #include "ostra.h"
-#include "Platform/EventScheduler.h"
-#include "Platform/Threads.h"
 #include "Platform/VirtualClock.h"
-#include "Platform/WaitableObjects.h"
 #include "Support/ResourceCount.h"
 #include "Support/SimulatedHost.h"
+#include "Sweeps/ExemptDevice.h"
+#include "Sweeps/FailingAllocator.h"
 #include "Utilities/Multithreading/Condition.h"
-
-namespace {
-
-/// Allocations until the one that fails; 0 while none is to fail.
-std::atomic<long> untilFailure = 0;
-std::atomic<bool> hasFailed = false;
-/// The simulated instrument, the bus and the test itself are not what is tested.
-thread_local int exempt = 0;
-
-struct Exempt {
-    Exempt() { ++exempt; }
-    ~Exempt() { --exempt; }
-    Exempt(const Exempt&) = delete;
-    Exempt& operator=(const Exempt&) = delete;
-};
-
-bool MustFail() {
-    if (exempt != 0 || untilFailure.load(std::memory_order_relaxed) == 0) {
-        return false;
-    }
-    if (untilFailure.fetch_sub(1) == 1) {
-        hasFailed = true;
-        return true;
-    }
-    return false;
-}
-
-void* Allocate(std::size_t size) {
-    return MustFail() ? nullptr : std::malloc(size == 0 ? 1 : size);
-}
-
-}  // namespace
-
-void* operator new(std::size_t size) {
-    if (void* const memory = Allocate(size)) {
-        return memory;
-    }
-    throw std::bad_alloc();
-}
-void* operator new[](std::size_t size) {
-    return operator new(size);
-}
-void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
-    return Allocate(size);
-}
-void* operator new[](std::size_t size, const std::nothrow_t&) noexcept {
-    return Allocate(size);
-}
-void operator delete(void* memory) noexcept {
-    std::free(memory);
-}
-void operator delete[](void* memory) noexcept {
-    std::free(memory);
-}
-void operator delete(void* memory, std::size_t) noexcept {
-    std::free(memory);
-}
-void operator delete[](void* memory, std::size_t) noexcept {
-    std::free(memory);
-}
 
 namespace Varnholt::Tests {
 namespace {
 
-using Platform::ErrorCode;
-using Platform::Usb::Transfer;
-using Platform::Usb::UsbDevice;
 using TestSupport::ResourceCount;
-
-/// A device whose own allocations do not fail.
-class ExemptDevice final : public UsbDevice {
-  public:
-    explicit ExemptDevice(std::shared_ptr<UsbDevice> behind) : device(std::move(behind)) {}
-    ~ExemptDevice() override {
-        const Exempt guard;
-        device.reset();
-    }
-    std::vector<Platform::Usb::EndpointInfo> Endpoints(ErrorCode& error) override {
-        return device->Endpoints(error);
-    }
-    ErrorCode Claim() override {
-        const Exempt guard;
-        return device->Claim();
-    }
-    void Release() override {
-        const Exempt guard;
-        device->Release();
-    }
-    ErrorCode Submit(Transfer& transfer) override {
-        const Exempt guard;
-        return device->Submit(transfer);
-    }
-    void Cancel(Transfer& transfer) override {
-        const Exempt guard;
-        device->Cancel(transfer);
-    }
-    ErrorCode ClearHalt(std::uint8_t endpoint) override {
-        const Exempt guard;
-        return device->ClearHalt(endpoint);
-    }
-
-  private:
-    std::shared_ptr<UsbDevice> device;
-};
 
 using Call = std::int32_t (*)();
 
@@ -147,14 +45,6 @@ struct Case {
 constexpr std::array Cases{Case{"Readout", &Readout, true}, Case{"ImageWrite", &ImageWrite, true},
                            Case{"NamedReadout", &NamedReadout, false}};
 
-/// The virtual clock makes a thread when an event comes while a lock is held; that one is not to be counted.
-void StartTheClocksOwnThread() {
-    Platform::CriticalSection section;
-    const Platform::CriticalSection::Holder held(section);
-    Platform::ClockScheduler().CallAt(Platform::ClockScheduler().Now() + 1, [] {});
-    Platform::SleepMilliseconds(1);
-}
-
 class AllocationFailure : public testing::TestWithParam<std::tuple<Transport, std::size_t>> {};
 
 TEST_P(AllocationFailure, EndsInAResultCodeAndLeavesNothing) {
@@ -167,22 +57,20 @@ TEST_P(AllocationFailure, EndsInAResultCodeAndLeavesNothing) {
         [](const std::string&, auto device) { return std::make_shared<ExemptDevice>(device); });
     StartTheClocksOwnThread();
     ASSERT_EQ(tested.call() == OSTRA_OK, tested.succeeds) << b5ae189db26b2a1b("LastError");
-    const ResourceCount before = ResourceCount::Take();
+    const ResourceCount before = ResourceCount::TakeSettled();
 
     long failures = 0;
     for (bool reached = true; reached; ++failures) {
         SCOPED_TRACE("allocation " + std::to_string(failures + 1));
-        hasFailed = false;
-        untilFailure = failures + 1;
         const std::uint64_t start = clock.ElapsedMilliseconds();
+        FailAllocation(failures + 1);
         const std::int32_t code = tested.call();
-        untilFailure = 0;
+        reached = StopFailing();
         ASSERT_LT(clock.ElapsedMilliseconds() - start, 12'000U);
-        reached = hasFailed;
         ASSERT_TRUE(code == OSTRA_OK || code == OSTRA_FAILURE || code == OSTRA_UNKNOWN_FAILURE) << code;
         ASSERT_FALSE(instrument.Claimed());
         ASSERT_EQ(instrument.PendingTransfers(), 0U);
-        ASSERT_TRUE(before.Settles()) << ResourceCount::Take();
+        ASSERT_TRUE(before.Settles()) << "before: " << before << "\nafter: " << ResourceCount::Take();
         if (!reached) {
             EXPECT_EQ(code == OSTRA_OK, tested.succeeds);
         }
@@ -206,14 +94,15 @@ TEST(AllocationFailureOfACondition, SaysThatItsStateCannotBeMade) {
     Utilities::Multithreading::Mutex mutex("ostra-allocation-failure-test");
     std::vector<std::string> texts;
     for (bool isMade = false; !isMade;) {
-        untilFailure = static_cast<long>(texts.size()) + 1;
+        FailAllocation(static_cast<long>(texts.size()) + 1);
         try {
             const Condition condition(mutex);
             isMade = true;
         } catch (const std::exception& exception) {
+            StopFailing();
             texts.emplace_back(exception.what());
         }
-        untilFailure = 0;
+        StopFailing();
     }
     EXPECT_THAT(texts, testing::Contains("ConditionImpl::ConditionImpl() can't allocate!"));
 }

@@ -66,18 +66,16 @@ ErrorCode SharedDevice::FindEndpoint(std::uint8_t endpoint, bool& found) {
     return Note(error);
 }
 
-ErrorCode SharedDevice::Submit(Usb::Transfer& transfer) {
+ErrorCode SharedDevice::Submit(Usb::Transfer& transfer) try {
     if ((halted.load(std::memory_order_acquire) & BitOf(transfer.endpoint)) != 0) {
         const ErrorCode code = ClearHalt(transfer.endpoint);
         if (code != Errors::Success) {
             return code;
         }
     }
-    try {
-        return Note(usb.load(std::memory_order_acquire)->Submit(transfer));
-    } catch (const std::bad_alloc&) {
-        return Errors::NotEnoughMemory;
-    }
+    return Note(usb.load(std::memory_order_acquire)->Submit(transfer));
+} catch (const std::bad_alloc&) {
+    return Errors::NotEnoughMemory;
 }
 
 void SharedDevice::Cancel(Usb::Transfer& transfer) {

@@ -20,8 +20,9 @@ class WaitableObject;
 using Microseconds = std::uint64_t;
 inline constexpr Microseconds Never = std::numeric_limits<Microseconds>::max();
 
-/// Wakes one thread. Shared, so that it can be rung after its thread has ended.
-using Bell = std::shared_ptr<std::condition_variable>;
+/// What a thread waits at. There is a fixed number of them, which are never destroyed: a bell takes no memory
+/// and can be rung after its thread has ended. Threads may share one, so all who wait are woken, and look.
+using Bell = std::condition_variable*;
 
 /// The kernel lock, held. See Kernel.h.
 class KernelHold final : private std::unique_lock<std::mutex> {

@@ -1,8 +1,9 @@
 #include <atomic>
 #include <cstdio>
 #include <cstdlib>
-#include <list>
+#include <memory>
 #include <mutex>
+#include <new>
 
 #include "Platform/Posix/Kernel.h"
 #include "Platform/WaitableObjects.h"
@@ -21,6 +22,8 @@ class EnteringSection final : public BlockedCall {
         return "a critical section owned by thread " + std::to_string(owner);
     }
 
+    EnteringSection* next = nullptr;
+
   private:
     const std::uint32_t owner;
 };
@@ -37,7 +40,7 @@ struct CriticalSection::Impl {
     // Where threads take turns. Guarded by the kernel lock; the first two are the owner's.
     bool ownerTakesTurns = false;
     std::uint32_t ownersNumber = 0;
-    std::list<EnteringSection*> entering;
+    EnteringSection* entering = nullptr;
 
     void EnterInTurn(ThreadRecord& me, Clock& clock);
     void LeaveInTurn(Clock& clock);
@@ -56,9 +59,17 @@ void CriticalSection::Impl::EnterInTurn(ThreadRecord& me, Clock& clock) {
             break;
         }
         EnteringSection call(me, ownersNumber);
-        entering.push_back(&call);
+        EnteringSection** last = &entering;
+        while (*last) {
+            last = &(*last)->next;
+        }
+        *last = &call;
         clock.Block(hold, call, Never);
-        entering.remove(&call);
+        EnteringSection** link = &entering;
+        while (*link != &call) {
+            link = &(*link)->next;
+        }
+        *link = call.next;
         if (call.hopeless) {
             std::fprintf(stderr, "A critical section that is never left cannot be entered.\n");
             std::abort();
@@ -71,42 +82,53 @@ void CriticalSection::Impl::EnterInTurn(ThreadRecord& me, Clock& clock) {
 void CriticalSection::Impl::LeaveInTurn(Clock& clock) {
     KernelHold hold;
     lock.unlock();
-    for (EnteringSection* const call : entering) {
+    for (EnteringSection* call = entering; call; call = call->next) {
         clock.Wake(*call);
     }
     clock.Preempt(hold);
 }
 
-CriticalSection::CriticalSection() : impl(std::make_unique<Impl>()) {}
+CriticalSection::CriticalSection() {
+    static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
+    std::construct_at(reinterpret_cast<Impl*>(storage));
+}
 
-CriticalSection::~CriticalSection() = default;
+CriticalSection::~CriticalSection() {
+    std::destroy_at(&Own());
+}
+
+CriticalSection::Impl& CriticalSection::Own() {
+    return *std::launder(reinterpret_cast<Impl*>(storage));
+}
 
 void CriticalSection::Enter() {
+    Impl& impl = Own();
     ThreadRecord& me = CurrentThread();
-    if (impl->owner.load(std::memory_order_relaxed) != &me) {
+    if (impl.owner.load(std::memory_order_relaxed) != &me) {
         Clock& clock = CurrentClock();
         if (clock.TakesTurns()) {
-            impl->EnterInTurn(me, clock);
+            impl.EnterInTurn(me, clock);
         } else {
-            impl->lock.lock();
+            impl.lock.lock();
         }
-        impl->owner.store(&me, std::memory_order_relaxed);
+        impl.owner.store(&me, std::memory_order_relaxed);
         ++me.sectionsHeld;
     }
-    ++impl->depth;
+    ++impl.depth;
 }
 
 void CriticalSection::Leave() {
-    if (--impl->depth > 0) {
+    Impl& impl = Own();
+    if (--impl.depth > 0) {
         return;
     }
-    impl->owner.store(nullptr, std::memory_order_relaxed);
+    impl.owner.store(nullptr, std::memory_order_relaxed);
     --CurrentThread().sectionsHeld;
     Clock& clock = CurrentClock();
     if (clock.TakesTurns()) {
-        impl->LeaveInTurn(clock);
+        impl.LeaveInTurn(clock);
     } else {
-        impl->lock.unlock();
+        impl.lock.unlock();
     }
 }
 

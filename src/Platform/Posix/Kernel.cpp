@@ -2,6 +2,7 @@
 
 #include <pthread.h>
 
+#include <array>
 #include <atomic>
 #include <utility>
 
@@ -17,12 +18,12 @@ std::mutex kernelLock;
 
 /// Whoever is to be woken when the lock is let go of; guarded by it.
 struct Wakeup {
-    Bell bell;
+    Bell bell = nullptr;
     std::shared_ptr<CompletionSource> source;
 
     void Happen() const {
         if (bell) {
-            bell->notify_one();
+            bell->notify_all();
         }
         if (source) {
             source->Interrupt();
@@ -36,12 +37,19 @@ std::atomic<std::uint32_t> threadCount = 0;
 
 thread_local ThreadRecord* currentThread = nullptr;
 
+Bell BellOf(std::uint32_t thread) {
+    constexpr std::size_t Bells = 64;
+    static Immortal<std::array<std::condition_variable, Bells>> bells;
+    return &(*bells)[thread % Bells];
+}
+
 void ForgetThread(void* record) {
-    const std::unique_ptr<ThreadRecord> thread(static_cast<ThreadRecord*>(record));
+    auto& thread = *static_cast<ThreadRecord*>(record);
     // The mutexes are abandoned under the record's own name.
-    ThreadRecord* const before = BindCurrentThread(thread.get());
-    AbandonOwned(*thread);
-    BindCurrentThread(before == thread.get() ? nullptr : before);
+    ThreadRecord* const before = BindCurrentThread(&thread);
+    AbandonOwned(thread);
+    thread.source.reset();
+    BindCurrentThread(before == &thread ? nullptr : before);
 }
 
 /// Notices the end of threads that somebody else started. A `thread_local` with a destructor would keep this
@@ -104,11 +112,12 @@ void KernelHold::RingKept() {
     std::exchange(*keptWakeup, {}).Happen();
 }
 
-ThreadRecord::ThreadRecord() : number(++threadCount) {}
+ThreadRecord::ThreadRecord() : number(++threadCount), turn(BellOf(number)) {}
 
 ThreadRecord& CurrentThread() {
     if (!currentThread) {
-        currentThread = std::make_unique<ThreadRecord>().release();
+        thread_local Immortal<ThreadRecord> own;
+        currentThread = &*own;
         endOfThread.Watch(*currentThread);
     }
     return *currentThread;

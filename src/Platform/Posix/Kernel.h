@@ -17,7 +17,8 @@ namespace Varnholt::Platform::Posix {
 
 class MutexObject;
 
-/// One thread as the platform knows it. Made for a thread at its first platform call, or by `StartThread`.
+/// One thread as the platform knows it. Made by `StartThread`, or for any other thread at its first platform
+/// call, which cannot fail for want of memory: the record is then in the thread's own storage.
 class ThreadRecord final {
   public:
     ThreadRecord();
@@ -27,7 +28,7 @@ class ThreadRecord final {
     const std::uint32_t number;  ///< for messages
 
     // Guarded by the kernel lock.
-    const Bell turn = std::make_shared<std::condition_variable>();
+    const Bell turn;
     std::vector<std::shared_ptr<MutexObject>> owned;
 
     // Only the thread itself uses these.

@@ -54,7 +54,7 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
     const std::shared_ptr<ThreadObject> object = start->object;
     ThreadRecord& record = *start->record;
     object->number = record.number;
-    const Handle handle = HandleTable::Instance().Add(object);
+    OwnedHandle handle(HandleTable::Instance().Add(object));
     {
         KernelHold hold;
         CurrentClock().ThreadMade(hold, record);
@@ -66,14 +66,14 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
             KernelHold hold;
             CurrentClock().ThreadNeverBegan(hold, record);
         }
-        Close(handle);
+        handle.Reset();
         SetLastError(Errors::NotEnoughMemory);
         return NoHandle;
     }
     static_cast<void>(start.release());  // the thread's now
     KernelHold hold;
     CurrentClock().Preempt(hold);
-    return handle;
+    return handle.Release();
 }
 
 }  // namespace

@@ -60,7 +60,7 @@ VirtualTime::~VirtualTime() {
     installer.state = State::Unknown;
     InstallClock(nullptr);
     eventThreadMustEnd = true;
-    eventThread.turn->notify_one();
+    eventThread.turn->notify_all();
     hold.unlock();
     if (hasEventThread) {
         pthread_join(systemEventThread, nullptr);
@@ -148,7 +148,7 @@ void VirtualTime::HandOver(KernelHold& hold, ThreadRecord& self) {
         }
         next->state = State::Running;
         if (next != &self) {
-            next->turn->notify_one();
+            next->turn->notify_all();
             AwaitTurn(hold, self);
         }
     }
@@ -181,7 +181,7 @@ void VirtualTime::GiveUpSlice(KernelHold& hold) {
     if (next) {
         self.state = State::Ready;
         next->state = State::Running;
-        next->turn->notify_one();
+        next->turn->notify_all();
         AwaitTurn(hold, self);
         HandOver(hold, self);
     } else {
@@ -211,7 +211,7 @@ void VirtualTime::Advance(KernelHold& hold, ThreadRecord& self) {
             HostEvent(hold, self);
         } else {
             eventThreadMustCall = true;
-            eventThread.turn->notify_one();
+            eventThread.turn->notify_all();
             AwaitTurn(hold, self);
         }
         return;
@@ -230,12 +230,12 @@ void VirtualTime::Advance(KernelHold& hold, ThreadRecord& self) {
 void VirtualTime::PassOn() {
     if (ThreadRecord* const next = ChooseReady()) {
         next->state = State::Running;
-        next->turn->notify_one();
+        next->turn->notify_all();
         return;
     }
     const auto blocked = std::ranges::find(threads, State::Blocked, &ThreadRecord::state);
     (*blocked)->mustAdvance = true;
-    (*blocked)->turn->notify_one();
+    (*blocked)->turn->notify_all();
 }
 
 void VirtualTime::ThreadMade(KernelHold& /*hold*/, ThreadRecord& thread) {

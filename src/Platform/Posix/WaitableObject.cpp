@@ -1,7 +1,6 @@
 #include "Platform/Posix/WaitableObject.h"
 
 #include <algorithm>
-#include <vector>
 
 namespace Varnholt::Platform::Posix {
 namespace {
@@ -15,24 +14,22 @@ constexpr Microseconds LongestLook = 4000;
 /// One wait, entered with each of its objects.
 class Waiter final : public BlockedCall {
   public:
-    Waiter(ThreadRecord& caller, std::span<const ObjectRef> waitedFor)
-        : BlockedCall(caller), objects(waitedFor), entriesOfMany(objects.size() > 1 ? objects.size() : 0) {
-        for (std::size_t i = 0; i < objects.size(); ++i) {
-            WaitEntry& entry = Entries()[i];
+    Waiter(ThreadRecord& caller, std::span<WaitEntry> waitedFor) : BlockedCall(caller), entries(waitedFor) {
+        for (WaitEntry& entry : entries) {
             entry.waiter = this;
-            objects[i]->Enqueue(entry);
+            entry.object->Enqueue(entry);
         }
-        mayWorkOff = objects.size() == 1;  // who listens to several things waits for long, and is not urgent
+        mayWorkOff = entries.size() == 1;  // who listens to several things waits for long, and is not urgent
     }
     ~Waiter() {
-        for (std::size_t i = 0; i < objects.size(); ++i) {
-            objects[i]->Dequeue(Entries()[i]);
+        for (WaitEntry& entry : entries) {
+            entry.object->Dequeue(entry);
         }
     }
 
     bool Take() {
-        const auto untilTaken = [this](const ObjectRef& object) { return Offer(*object); };
-        return std::ranges::any_of(objects, untilTaken);
+        const auto untilTaken = [this](const WaitEntry& entry) { return Offer(*entry.object); };
+        return std::ranges::any_of(entries, untilTaken);
     }
 
     /// True when the object was taken.
@@ -42,8 +39,8 @@ class Waiter final : public BlockedCall {
             return false;
         }
         const auto found = std::ranges::find_if(
-            objects, [&](const ObjectRef& waitedFor) { return waitedFor.get() == &object; });
-        outcome.index = static_cast<std::size_t>(found - objects.begin());
+            entries, [&](const WaitEntry& entry) { return entry.object.get() == &object; });
+        outcome.index = static_cast<std::size_t>(found - entries.begin());
         outcome.result =
             taken == WaitableObject::Taken::Abandoned ? WaitResult::Abandoned : WaitResult::Signalled;
         return true;
@@ -53,24 +50,20 @@ class Waiter final : public BlockedCall {
     const WaitAnyResult& Outcome() const { return outcome; }
 
     bool NeedsOtherProcess() const {
-        return std::ranges::any_of(objects,
-                                   [](const ObjectRef& object) { return object->IsHeldElsewhere(); });
+        return std::ranges::any_of(entries,
+                                   [](const WaitEntry& entry) { return entry.object->IsHeldElsewhere(); });
     }
 
     std::string Describe() const override {
         std::string text;
-        for (const auto& object : objects) {
-            text += (text.empty() ? "" : " or ") + object->Describe();
+        for (const WaitEntry& entry : entries) {
+            text += (text.empty() ? "" : " or ") + entry.object->Describe();
         }
         return text;
     }
 
   private:
-    WaitEntry* Entries() { return entriesOfMany.empty() ? &entryOfOne : entriesOfMany.data(); }
-
-    const std::span<const ObjectRef> objects;
-    WaitEntry entryOfOne;  // most waits are for one object, and take no memory
-    std::vector<WaitEntry> entriesOfMany;
+    const std::span<WaitEntry> entries;
     WaitAnyResult outcome{WaitResult::TimedOut, 0};
 };
 
@@ -98,10 +91,10 @@ void WaitableObject::OfferToWaiters() {
     }
 }
 
-WaitAnyResult WaitForAny(KernelHold& hold, std::span<const ObjectRef> objects, Microseconds deadline) {
-    Waiter waiter(CurrentThread(), objects);
+WaitAnyResult WaitForAny(KernelHold& hold, std::span<WaitEntry> entries, Microseconds deadline) {
+    Waiter waiter(CurrentThread(), entries);
     Clock& clock = CurrentClock();
-    WaitableObject* const only = objects.size() == 1 ? objects[0].get() : nullptr;
+    WaitableObject* const only = entries.size() == 1 ? entries[0].object.get() : nullptr;
     Microseconds period = FirstLook;
     while (true) {
         // Before the look at the object, so that no change comes between the two.

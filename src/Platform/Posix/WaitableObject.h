@@ -12,10 +12,15 @@
 
 namespace Varnholt::Platform::Posix {
 
+class WaitableObject;
 class Waiter;
 
-/// A wait's place in the queue of one of its objects.
+using ObjectRef = std::shared_ptr<WaitableObject>;
+
+/// One of the objects that a wait is for, and the wait's place in its queue. On the stack of the thread that
+/// waits: a wait takes no memory.
 struct WaitEntry {
+    ObjectRef object;
     Waiter* waiter = nullptr;
     WaitEntry* previous = nullptr;
     WaitEntry* next = nullptr;
@@ -65,10 +70,8 @@ class WaitableObject {
     std::size_t handles = 0;
 };
 
-using ObjectRef = std::shared_ptr<WaitableObject>;
-
-/// Waits until one of `objects` could be taken for the calling thread. With the kernel lock held; lets go of
-/// it while blocked.
-WaitAnyResult WaitForAny(KernelHold& hold, std::span<const ObjectRef> objects, Microseconds deadline);
+/// Waits until the object of one of `entries` could be taken for the calling thread. With the kernel lock
+/// held; lets go of it while blocked.
+WaitAnyResult WaitForAny(KernelHold& hold, std::span<WaitEntry> entries, Microseconds deadline);
 
 }  // namespace Varnholt::Platform::Posix

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <array>
-#include <vector>
 
 #include "Platform/CallFilter.h"
 #include "Platform/Posix/EventObject.h"
@@ -44,17 +43,17 @@ bool OnObject(Handle handle, Action action) {
     return Succeeded(code);
 }
 
-/// A wait that there is no memory for fails; it throws nothing, because destructors wait.
-WaitAnyResult WaitForObjects(std::span<const ObjectRef> objects, std::uint32_t timeout) try {
+/// Throws nothing, because destructors wait: a mutex that there is no memory to own is not acquired.
+WaitAnyResult WaitForObjects(std::span<WaitEntry> entries, std::uint32_t timeout) try {
     const Microseconds deadline = DeadlineAfter(timeout);
     WaitAnyResult outcome{};
     {
         KernelHold hold;
         CurrentClock().Preempt(hold);
-        outcome = WaitForAny(hold, objects, deadline);
+        outcome = WaitForAny(hold, entries, deadline);
     }
     if (outcome.result == WaitResult::Signalled) {
-        objects[outcome.index]->AfterWait();
+        entries[outcome.index].object->AfterWait();
     }
     return outcome;
 } catch (const std::bad_alloc&) {
@@ -113,8 +112,8 @@ WaitResult Wait(Handle handle, std::uint32_t timeout) {
     if (CallMustFail("Wait")) {
         return WaitResult::Failed;
     }
-    const std::array objects{HandleTable::Instance().Find(handle)};
-    return objects[0] ? WaitForObjects(objects, timeout).result : WaitResult::Failed;
+    std::array entries{WaitEntry{HandleTable::Instance().Find(handle)}};
+    return entries[0].object ? WaitForObjects(entries, timeout).result : WaitResult::Failed;
 }
 
 WaitAnyResult WaitAny(std::span<const Handle> handles, std::uint32_t timeout) {
@@ -125,14 +124,14 @@ WaitAnyResult WaitAny(std::span<const Handle> handles, std::uint32_t timeout) {
         SetLastError(Errors::InvalidParameter);
         return {WaitResult::Failed, 0};
     }
-    std::vector<ObjectRef> objects;
-    for (const Handle handle : handles) {
-        objects.push_back(HandleTable::Instance().Find(handle));
-        if (!objects.back()) {
+    std::array<WaitEntry, MostObjectsPerWait> entries;
+    for (std::size_t i = 0; i < handles.size(); ++i) {
+        entries[i].object = HandleTable::Instance().Find(handles[i]);
+        if (!entries[i].object) {
             return {WaitResult::Failed, 0};
         }
     }
-    return WaitForObjects(objects, timeout);
+    return WaitForObjects(std::span(entries).first(handles.size()), timeout);
 }
 
 WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) {
@@ -140,8 +139,8 @@ WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) 
         return WaitResult::Failed;
     }
     const ObjectRef signalled = HandleTable::Instance().Find(toSignal);
-    const std::array objects{signalled ? HandleTable::Instance().Find(toWait) : nullptr};
-    if (!objects[0]) {
+    std::array entries{WaitEntry{signalled ? HandleTable::Instance().Find(toWait) : nullptr}};
+    if (!entries[0].object) {
         return WaitResult::Failed;
     }
     const Microseconds deadline = DeadlineAfter(timeout);
@@ -152,10 +151,10 @@ WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) 
         if (!Succeeded(signalled->Signal(CurrentThread()))) {
             return WaitResult::Failed;
         }
-        result = WaitForAny(hold, objects, deadline).result;
+        result = WaitForAny(hold, entries, deadline).result;
     }
     if (result == WaitResult::Signalled) {
-        objects[0]->AfterWait();
+        entries[0].object->AfterWait();
     }
     return result;
 }

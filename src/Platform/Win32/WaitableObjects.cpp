@@ -1,6 +1,8 @@
 #include "Platform/WaitableObjects.h"
 
 #include <algorithm>
+#include <memory>
+#include <new>
 
 #include "Platform/CallFilter.h"
 #include "Platform/Win32/Windows.h"
@@ -103,16 +105,25 @@ struct CriticalSection::Impl {
     CRITICAL_SECTION section{};
 };
 
-CriticalSection::CriticalSection() : impl(std::make_unique<Impl>()) {}
+CriticalSection::CriticalSection() {
+    static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
+    std::construct_at(reinterpret_cast<Impl*>(storage));
+}
 
-CriticalSection::~CriticalSection() = default;
+CriticalSection::~CriticalSection() {
+    std::destroy_at(&Own());
+}
+
+CriticalSection::Impl& CriticalSection::Own() {
+    return *std::launder(reinterpret_cast<Impl*>(storage));
+}
 
 void CriticalSection::Enter() {
-    ::EnterCriticalSection(&impl->section);
+    ::EnterCriticalSection(&Own().section);
 }
 
 void CriticalSection::Leave() {
-    ::LeaveCriticalSection(&impl->section);
+    ::LeaveCriticalSection(&Own().section);
 }
 
 }  // namespace Varnholt::Platform

@@ -1,0 +1,308 @@
+// The operations of the USBIO classes with the first, second, third... allocation failing, until one gets by
+// without a failure.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <array>
+#include <cstdio>
+#include <functional>
+#include <iterator>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "Platform/Threads.h"
+#include "Platform/VirtualClock.h"
+#include "Protocol/Instrument.h"
+#include "Support/SimulatedHost.h"
+#include "Sweeps/ExemptDevice.h"
+#include "Sweeps/FailingAllocator.h"
+#include "UsbIo/CUsbIoReader.h"
+#include "UsbIo/CUsbIoWriter.h"
+#include "UsbIo/ScopedDeviceList.h"
+
+namespace Varnholt::UsbIo {
+namespace {
+
+using namespace Protocol;
+using namespace Protocol::UsbIoDriver;
+using Tests::Exempt;
+using Tests::FailAllocation;
+
+/// What the operations that answer with a truth are taken to answer with.
+constexpr std::uint32_t False = Status::Failed;
+constexpr std::uint32_t StatusOf(bool succeeded) {
+    return succeeded ? Status::Success : False;
+}
+
+/// A configured instrument, and a pipe that is bound to its data and delivers none.
+struct World {
+    World() {
+        host.Add("one");
+        host.Bus().WrapDevices(
+            [](const std::string&, auto opened) { return std::make_shared<Tests::ExemptDevice>(opened); });
+        const ScopedDeviceList list(InterfaceClass);
+        EXPECT_EQ(device.Open(0, list.Get(), &InterfaceClass), Status::Success);
+        EXPECT_EQ(device.SetConfiguration({0, interfaces}), Status::Success);
+        EXPECT_EQ(pipe.Bind(0, BulkInEndpoint, list.Get(), &InterfaceClass), Status::Success);
+    }
+    ~World() { EXPECT_EQ(host.Bus().Instrument("one").PendingTransfers(), 0U); }
+
+    static constexpr std::array<InterfaceSetting, 1> interfaces{{{0, 0, 65536}}};
+    Tests::SimulatedHost host{Tests::Transport::UsbIo};
+    CUsbIo device;
+    CUsbIoPipe pipe;
+    static constexpr std::uint32_t Room = 64;
+    std::array<std::uint8_t, Room> data{};
+    std::uint32_t size = Room;
+    ClassOrVendorRequest request{};
+};
+
+std::uint32_t Make(World&) {
+    CUsbIo device;
+    CUsbIoPipe pipe;
+    CUsbIoReader reader;
+    const CUsbIoBufferPool pool;
+    const CUsbIoBuffer buffer(64);
+    return StatusOf(buffer.Buffer != nullptr);
+}
+
+std::uint32_t MakeList(World&) {
+    const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+    return StatusOf(list != nullptr && CUsbIo::DestroyDeviceList(list));
+}
+
+std::uint32_t OpenOne(World&, Platform::DeviceList list) {
+    CUsbIo device;
+    const std::uint32_t status = device.Open(0, list, &InterfaceClass);
+    EXPECT_EQ(device.IsOpen(), status == Status::Success);
+    return status;
+}
+
+std::uint32_t Open(World& world) {
+    Platform::DeviceList list = nullptr;
+    {
+        const Exempt guard;
+        list = CUsbIo::CreateDeviceList(&InterfaceClass);
+    }
+    const std::uint32_t status = OpenOne(world, list);
+    CUsbIo::DestroyDeviceList(list);
+    return status;
+}
+
+std::uint32_t OpenByNumber(World& world) {
+    return OpenOne(world, nullptr);
+}
+
+std::uint32_t BindPipe(World& world) {
+    world.pipe.Close();
+    const ScopedDeviceList list(InterfaceClass);
+    if (!list.Get()) {
+        return Status::NoMemory;
+    }
+    CUsbIoPipe other;
+    return other.Bind(0, BulkInEndpoint, list.Get(), &InterfaceClass);
+}
+
+std::uint32_t Configure(World& world) {
+    {
+        const Exempt guard;
+        world.pipe.Close();
+        world.device.Close();  // the next configuration opens the device anew
+        const ScopedDeviceList list(InterfaceClass);
+        EXPECT_EQ(world.device.Open(0, list.Get(), &InterfaceClass), Status::Success);
+    }
+    const std::uint32_t status = world.device.SetConfiguration({0, World::interfaces});
+    return status != Status::Success ? status : world.device.UnconfigureDevice();
+}
+
+std::uint32_t Ask(World& world) {
+    DriverInfo info;
+    DeviceParameters parameters;
+    for (const std::uint32_t status :
+         {world.device.GetDriverInfo(info), world.device.GetDeviceParameters(parameters),
+          world.device.SetDeviceParameters(parameters),
+          StatusOf(world.device.GetDevicePathName() != nullptr)}) {
+        if (status != Status::Success) {
+            return status;
+        }
+    }
+    return Status::Success;
+}
+
+std::uint32_t RequestIn(World& world) {
+    world.size = 8;
+    world.request.type = RequestBlock::TypeVendor;
+    world.request.request = static_cast<std::uint8_t>(Request::GetMisc);
+    return world.device.ClassOrVendorInRequest(world.data.data(), world.size, world.request);
+}
+
+std::uint32_t RequestOut(World& world) {
+    world.size = 1;
+    world.data[0] = 31;
+    world.request.type = RequestBlock::TypeVendor;
+    world.request.request = static_cast<std::uint8_t>(Request::Reset);
+    return world.device.ClassOrVendorOutRequest(world.data.data(), world.size, world.request);
+}
+
+std::uint32_t ReadInVain(World& world) {
+    world.size = World::Room;
+    return world.pipe.ReadSync(world.data.data(), world.size, 10);
+}
+
+std::uint32_t ReadUntilEvent(World& world) {
+    const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
+    if (!event) {
+        return Status::NoMemory;
+    }
+    Platform::SignalEvent(event.Get());
+    world.size = World::Room;
+    return world.pipe.ReadSyncUntil(world.data.data(), world.size, Platform::Infinite, event.Get());
+}
+
+std::uint32_t WriteAtOnce(World& world) {
+    world.size = 1;
+    return world.pipe.WriteSync(world.data.data(), world.size, 10);
+}
+
+/// A read that is started, waited for in vain and ended by `end`.
+std::uint32_t ReadAndEnd(World& world, const std::function<std::uint32_t(World&)>& end) {
+    CUsbIoBuffer buffer(world.data.data(), World::Room);
+    buffer.NumberOfBytesToTransfer = buffer.Size;
+    if (!world.pipe.Read(buffer)) {
+        return buffer.Status;
+    }
+    const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
+    if (const std::uint32_t status = world.pipe.WaitForCompletion(buffer, 10, event.Get());
+        status != Status::TimedOut) {
+        return status;
+    }
+    if (const std::uint32_t status = end(world); status != Status::Success) {
+        return status;
+    }
+    return world.pipe.WaitForCompletion(buffer, Platform::Infinite);
+}
+
+std::uint32_t Abort(World& world) {
+    return ReadAndEnd(world, [](World& self) { return self.pipe.AbortPipe(); });
+}
+
+std::uint32_t CancelOwn(World& world) {
+    return ReadAndEnd(world, [](World& self) { return StatusOf(self.pipe.CancelIo()); });
+}
+
+std::uint32_t UsePool(World&) {
+    CUsbIoBufferPool pool;
+    const bool allocated = pool.Allocate(64, 3);
+    EXPECT_EQ(pool.CurrentCount(), allocated ? 3U : 0U);
+    if (CUsbIoBuffer* const buffer = pool.Get()) {
+        pool.Put(buffer);
+    }
+    pool.Free();
+    return StatusOf(allocated);
+}
+
+/// Lets the thread of a stream run for a while.
+template <class Stream>
+std::uint32_t RunStream(World& world) {
+    world.pipe.Close();
+    Stream stream;
+    {
+        const Exempt guard;
+        const ScopedDeviceList list(InterfaceClass);
+        EXPECT_EQ(stream.Bind(0, std::is_same_v<Stream, CUsbIoReader> ? BulkInEndpoint : BulkOutEndpoint,
+                              list.Get(), &InterfaceClass),
+                  Status::Success);
+    }
+    if (!stream.AllocateBuffers(64, 3) || !stream.StartThread()) {
+        return False;
+    }
+    Platform::SleepMilliseconds(10);
+    return StatusOf(stream.ShutdownThread());
+}
+
+std::uint32_t TellError(World& world) {
+    auto* const text = reinterpret_cast<char*>(world.data.data());
+    return StatusOf(CUsbIo::ErrorText(text, world.data.size(), Status::NoMemory) == text && *text == 'E');
+}
+
+struct Case {
+    const char* name;
+    std::uint32_t (*call)(World&);
+    std::uint32_t status;  ///< when no allocation fails
+};
+constexpr std::array Cases{
+    Case{"Make", &Make, Status::Success},
+    Case{"MakeList", &MakeList, Status::Success},
+    Case{"Open", &Open, Status::Success},
+    Case{"OpenByNumber", &OpenByNumber, Status::DeviceNotFound},
+    Case{"BindPipe", &BindPipe, Status::Success},
+    Case{"Configure", &Configure, Status::Success},
+    Case{"Ask", &Ask, Status::Success},
+    Case{"RequestIn", &RequestIn, Status::Success},
+    Case{"RequestOut", &RequestOut, Status::Success},
+    Case{"ReadInVain", &ReadInVain, Status::TimedOut},
+    Case{"ReadUntilEvent", &ReadUntilEvent, Status::UserEvent},
+    Case{"WriteAtOnce", &WriteAtOnce, Status::InvalidDirection},
+    Case{"Abort", &Abort, Status::Cancelled},
+    Case{"CancelOwn", &CancelOwn, Status::Cancelled},
+    Case{"UsePool", &UsePool, Status::Success},
+    Case{"Reader", &RunStream<CUsbIoReader>, Status::Success},
+    Case{"Writer", &RunStream<CUsbIoWriter>, Status::Success},
+    Case{"TellError", &TellError, Status::Success},
+};
+
+bool TellsOfMemory(std::uint32_t status) {
+    constexpr std::array codes{False, Status::NoMemory, Platform::Errors::NotEnoughMemory,
+                               Platform::Errors::NoSystemResources};
+    return std::ranges::find(codes, status) != codes.end();
+}
+
+class UsbIoAllocation : public testing::TestWithParam<Case> {};
+
+TEST_P(UsbIoAllocation, EveryFailureIsAStatus) {
+    const Case& tested = GetParam();
+    const Platform::VirtualClock clock(1);
+    Tests::StartTheClocksOwnThread();
+    int failures = 0;
+    for (bool reached = true; reached; ++failures) {
+        SCOPED_TRACE("allocation " + std::to_string(failures + 1));
+        World world;
+        FailAllocation(failures + 1);
+        const std::uint32_t status = tested.call(world);
+        reached = Tests::StopFailing();
+        EXPECT_TRUE(status == tested.status || (reached && TellsOfMemory(status))) << std::hex << status;
+        EXPECT_EQ(tested.call(world), tested.status) << "nothing is left of the failure";
+        ASSERT_LT(failures, 1000);
+    }
+    std::printf("%d allocations failed in turn\n", failures - 1);
+}
+
+INSTANTIATE_TEST_SUITE_P(All, UsbIoAllocation, testing::ValuesIn(Cases),
+                         [](const auto& parameter) { return std::string(parameter.param.name); });
+
+/// What the platform keeps of a thread that it did not start takes no memory either.
+TEST(UsbIoAllocationOfAThread, ItsFirstCallTakesNoMemory) {
+    const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
+    Platform::CriticalSection section;
+    const std::array handles{event.Get(), event.Get()};
+    const std::function<void()> calls[] = {
+        [&] { const Platform::CriticalSection::Holder hold(section); },
+        [&] { Platform::SignalEvent(event.Get()); },
+        [&] { Platform::WaitAny(handles, 1); },
+        [] { Platform::Close(Platform::NoHandle); },
+        [] { Platform::SleepMilliseconds(1); },
+    };
+    for (const auto& call : calls) {
+        bool failed = false;
+        std::thread([&] {
+            FailAllocation(1);
+            call();
+            failed = Tests::StopFailing();
+        }).join();
+        EXPECT_FALSE(failed) << "call " << &call - std::begin(calls);
+    }
+}
+
+}  // namespace
+}  // namespace Varnholt::UsbIo
