@@ -1,7 +1,6 @@
 #include "FaultInjector.h"
 
 #include <algorithm>
-#include <atomic>
 #include <map>
 #include <mutex>
 #include <new>
@@ -11,7 +10,6 @@
 
 #include "DataFaults.h"
 #include "Passage.h"
-#include "Platform/Threads.h"
 
 namespace Varnholt::Simulator {
 
@@ -68,10 +66,12 @@ class FaultInjector final : public UsbDevice, private TransferClient {
     ErrorCode PassOn(const PassagePointer& passage);
     bool AnswerWithLastData(const PassagePointer& passage);
     void HoldFor(const PassagePointer& passage, std::uint32_t milliseconds);
-    void TimeHasCome(const PassagePointer& passage);
+    void TimeHasCome(const PassagePointer& passage) noexcept;
+    ErrorCode GoOn(const PassagePointer& passage) noexcept;
     void TransferCompleted(Transfer& transfer) noexcept override;
     void ChangeOutcome(Passage& passage);
     void UnplugDevice();
+    void EndAll(TransferStatus status);
 
     /// Takes a transfer out of the ones under way; null when it has ended already.
     PassagePointer TakeOut(const Passage& passage);
@@ -79,7 +79,7 @@ class FaultInjector final : public UsbDevice, private TransferClient {
     void End(const Passage& passage, TransferStatus status, std::uint32_t actualLength);
     bool Gone();
 
-    const std::shared_ptr<UsbDevice> device;
+    std::shared_ptr<UsbDevice> device;
     const std::shared_ptr<FaultScript> script;
     Platform::EventScheduler& scheduler;
     const std::function<void()> unplug;
@@ -90,8 +90,6 @@ class FaultInjector final : public UsbDevice, private TransferClient {
     std::map<const Passage*, EventId> alarms;
     std::set<std::uint8_t> halted;
     bool gone = false;
-
-    std::atomic<int> completing = 0;  // completions by the device that are being dealt with
 };
 
 FaultInjector::~FaultInjector() {
@@ -103,23 +101,8 @@ FaultInjector::~FaultInjector() {
     for (const auto& [passage, alarm] : waiting) {
         scheduler.Forget(alarm);
     }
-    std::vector<PassagePointer> open;
-    {
-        const std::lock_guard lock(mutex);
-        for (const auto& [original, passage] : passages) {
-            open.push_back(passage);
-        }
-    }
-    for (const PassagePointer& passage : open) {
-        Cancel(*passage->original);
-    }
-    const auto quiet = [this] {
-        const std::lock_guard lock(mutex);
-        return passages.empty() && completing == 0;
-    };
-    while (!quiet()) {
-        Platform::SleepMilliseconds(1);
-    }
+    EndAll(TransferStatus::Cancelled);
+    device.reset();  // returns when what it still had has completed
 }
 
 bool FaultInjector::Gone() {
@@ -149,14 +132,22 @@ ErrorCode FaultInjector::Submit(Transfer& transfer) try {
             passage->fault->kind = FaultKind::Stall;
         }
     }
-    try {
-        return Begin(passage);
-    } catch (...) {
-        TakeOut(*passage);
-        throw;
+    const ErrorCode code = GoOn(passage);
+    if (code != Errors::Success && !TakeOut(*passage)) {
+        return Errors::Success;  // cancelled meanwhile
     }
+    return code;
 } catch (const std::bad_alloc&) {
     return Errors::NotEnoughMemory;
+}
+
+/// With any code but `Success` the passage is still under way, and the caller's to end.
+ErrorCode FaultInjector::GoOn(const PassagePointer& passage) noexcept try {
+    return passage->Has(FaultKind::Late) && passage->wasHeld ? PassOn(passage) : Begin(passage);
+} catch (const std::bad_alloc&) {
+    return Errors::NotEnoughMemory;
+} catch (...) {
+    return Errors::GeneralFailure;
 }
 
 ErrorCode FaultInjector::Begin(const PassagePointer& passage) {
@@ -165,7 +156,7 @@ ErrorCode FaultInjector::Begin(const PassagePointer& passage) {
     }
     const std::optional<std::uint32_t> argument = passage->fault->argument;
     if (ScopeOfEndpoint(passage->endpoint) == FaultScope::Interrupt && !passage->Has(FaultKind::Late) &&
-        !std::exchange(passage->polled, true)) {
+        !passage->wasHeld) {
         HoldFor(passage, InterruptInterval);
         return Errors::Success;
     }
@@ -208,8 +199,10 @@ ErrorCode FaultInjector::Begin(const PassagePointer& passage) {
                 dataFaults.ReplaceOut(*passage);
             }
             return PassOn(passage);
-        case FaultKind::GoneBefore:
-            TakeOut(*passage);
+        case FaultKind::GoneBefore: {
+            const std::lock_guard lock(mutex);
+            passage->cancelWanted = true;  // the unplugging leaves it to the caller
+        }
             UnplugDevice();
             return Errors::DeviceNotConnected;
         case FaultKind::GoneDuring:
@@ -244,9 +237,7 @@ ErrorCode FaultInjector::PassOn(const PassagePointer& passage) {
             halted.erase(static_cast<std::uint8_t>(passage->setup.index));
         }
     }
-    const ErrorCode code = device->Submit(*passage);
-    if (code != Errors::Success) {
-        TakeOut(*passage);
+    if (const ErrorCode code = device->Submit(*passage); code != Errors::Success) {
         return code;
     }
     {
@@ -274,26 +265,39 @@ bool FaultInjector::AnswerWithLastData(const PassagePointer& passage) {
 }
 
 void FaultInjector::HoldFor(const PassagePointer& passage, std::uint32_t milliseconds) {
-    const EventId alarm = scheduler.CallAt(scheduler.Now() + std::uint64_t{milliseconds} * 1000,
-                                           [this, passage] { TimeHasCome(passage); });
+    passage->wasHeld = true;
+    {
+        const std::lock_guard lock(mutex);
+        alarms[passage.get()] = 0;  // first what can fail: no alarm is left that nobody knows
+    }
+    EventId alarm = 0;
+    try {
+        alarm = scheduler.CallAt(scheduler.Now() + std::uint64_t{milliseconds} * 1000,
+                                 [this, passage] { TimeHasCome(passage); });
+    } catch (...) {
+        const std::lock_guard lock(mutex);
+        alarms.erase(passage.get());
+        throw;
+    }
     const std::lock_guard lock(mutex);
-    if (const auto found = passages.find(passage->original);
-        found != passages.end() && found->second == passage && passage->state == Passage::State::Held) {
-        alarms[passage.get()] = alarm;
+    if (const auto found = alarms.find(passage.get()); found != alarms.end()) {
+        found->second = alarm;
     }
 }
 
-void FaultInjector::TimeHasCome(const PassagePointer& passage) {
+void FaultInjector::TimeHasCome(const PassagePointer& passage) noexcept {
     bool waiting = false;
     {
         const std::lock_guard lock(mutex);
         const auto found = passages.find(passage->original);
         waiting = found != passages.end() && found->second == passage;
     }
-    if (waiting && (passage->polled ? Begin(passage) : PassOn(passage)) != Errors::Success) {
-        passage->original->status = TransferStatus::DeviceGone;
-        passage->original->actualLength = 0;
-        passage->original->client->TransferCompleted(*passage->original);
+    if (waiting) {
+        const ErrorCode code = GoOn(passage);
+        if (code != Errors::Success) {
+            End(*passage,
+                code == Errors::DeviceNotConnected ? TransferStatus::DeviceGone : TransferStatus::IoError, 0);
+        }
     }
     // Known as waiting until now, so that the destructor waits for the end of this call.
     const std::lock_guard lock(mutex);
@@ -336,7 +340,6 @@ ErrorCode FaultInjector::ClearHalt(std::uint8_t endpoint) {
 }
 
 void FaultInjector::TransferCompleted(Transfer& transfer) noexcept {
-    ++completing;
     auto& passage = static_cast<Passage&>(transfer);
     const bool unplugs = passage.Has(FaultKind::GoneDuring) || passage.Has(FaultKind::GoneAfter);
     bool held = false;
@@ -355,7 +358,6 @@ void FaultInjector::TransferCompleted(Transfer& transfer) noexcept {
     if (unplugs) {
         UnplugDevice();
     }
-    --completing;
 }
 
 void FaultInjector::ChangeOutcome(Passage& passage) {
@@ -372,30 +374,41 @@ void FaultInjector::ChangeOutcome(Passage& passage) {
 }
 
 void FaultInjector::UnplugDevice() {
-    std::vector<PassagePointer> held;
-    std::vector<PassagePointer> inDevice;
     {
         const std::lock_guard lock(mutex);
         if (std::exchange(gone, true)) {
             return;
         }
-        for (const auto& [original, passage] : passages) {
-            passage->cancelWanted = true;
-            if (passage->state == Passage::State::InDevice) {
-                inDevice.push_back(passage);
-            } else if (passage->state != Passage::State::Submitting) {
-                held.push_back(passage);
-            }
-        }
     }
     if (unplug) {
         unplug();
     }
-    for (const PassagePointer& passage : held) {
-        End(*passage, TransferStatus::DeviceGone, 0);
-    }
-    for (const PassagePointer& passage : inDevice) {
-        device->Cancel(*passage);
+    EndAll(TransferStatus::DeviceGone);
+}
+
+/// Ends what is held with `status` and has the device end the rest. One at a time: this takes no memory.
+void FaultInjector::EndAll(TransferStatus status) {
+    while (true) {
+        PassagePointer passage;
+        Passage::State state{};
+        {
+            const std::lock_guard lock(mutex);
+            const auto found = std::ranges::find_if(
+                passages, [](const auto& underWay) { return !underWay.second->cancelWanted; });
+            if (found == passages.end()) {
+                return;
+            }
+            passage = found->second;
+            passage->cancelWanted = true;
+            state = passage->state;
+        }
+        if (state == Passage::State::InDevice) {
+            device->Cancel(*passage);
+        } else if (state != Passage::State::Submitting) {
+            const bool keepsData =
+                status == TransferStatus::Cancelled && state == Passage::State::HeldWithData;
+            End(*passage, status, keepsData ? passage->actualLength : 0);
+        }
     }
 }
 

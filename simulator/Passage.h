@@ -23,7 +23,7 @@ struct Passage : Platform::Usb::Transfer {
     std::optional<Fault> fault;
     State state = State::Held;
     bool cancelWanted = false;
-    bool polled = false;  // an interrupt transfer that was held until its endpoint was polled
+    bool wasHeld = false;                    // until it was late enough, or an interrupt endpoint was polled
     std::vector<std::uint8_t> replacedData;  // of an OUT transfer whose data are changed
 
     bool Has(FaultKind kind) const { return fault && fault->kind == kind; }

@@ -1,8 +1,12 @@
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <memory>
+#include <new>
 #include <numeric>
 #include <string>
+#include <utility>
+#include <vector>
 
 #include "FaultInjector.h"
 #include "Protocol/ByteOrder.h"
@@ -229,6 +233,47 @@ TEST_F(FaultInjectorTest, LateTransferReachesTheInstrumentLater) {
     EXPECT_EQ(1, last.completions) << "it does not outlive the device";
     EXPECT_EQ(TransferStatus::Cancelled, last.status);
     EXPECT_EQ(0U, scheduler.Waiting());
+}
+
+/// Wherever the memory runs out, a transfer is refused or ends, once, and nothing is waited for at the end.
+TEST_F(FaultInjectorTest, ATransferThatThereIsNoMemoryForEnds) {
+    class WithoutMemory final : public ManualScheduler, public UsbDevice {
+      public:
+        EventId CallAt(std::uint64_t time, std::function<void()> event) override {
+            return hasAlarms ? ManualScheduler::CallAt(time, std::move(event)) : throw std::bad_alloc();
+        }
+        std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode&) override { return {}; }
+        Platform::ErrorCode Claim() override { return Errors::Success; }
+        void Release() override {}
+        Platform::ErrorCode Submit(Platform::Usb::Transfer&) override { throw std::bad_alloc(); }
+        void Cancel(Platform::Usb::Transfer&) override { ADD_FAILURE() << "nothing was accepted"; }
+        Platform::ErrorCode ClearHalt(std::uint8_t) override { return Errors::Success; }
+
+        bool hasAlarms = true;
+    };
+    struct Case {
+        const char* name;
+        const char* plan;
+        bool hasAlarms;
+        int completions;
+    };
+    for (const Case& test : {Case{"at once", "", true, 0}, Case{"no alarm", "0:late=5", false, 0},
+                             Case{"later", "0:late=5", true, 1}, Case{"polled", "0:short=1", true, 1}}) {
+        SCOPED_TRACE(test.name);
+        const auto behind = std::make_shared<WithoutMemory>();
+        behind->hasAlarms = test.hasAlarms;
+        auto device =
+            InjectFaults(behind, std::make_shared<FaultScript>(FaultPlan::Parse(test.plan)), *behind);
+        TestTransfer transfer = TestTransfer::In(InterruptInEndpoint, 4);
+        const auto code = device->Submit(transfer);
+        EXPECT_EQ(test.completions == 0 ? Errors::NotEnoughMemory : Errors::Success, code);
+        behind->Advance(10'000);
+        EXPECT_EQ(test.completions, transfer.completions);
+        EXPECT_TRUE(test.completions == 0 || transfer.status == TransferStatus::IoError);
+        device.reset();
+        EXPECT_EQ(test.completions, transfer.completions);
+        EXPECT_EQ(0U, behind->Waiting());
+    }
 }
 
 TEST_F(FaultInjectorTest, LateCancelBringsDataWithTheCancellation) {

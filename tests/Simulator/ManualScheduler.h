@@ -9,7 +9,7 @@
 namespace Varnholt::Simulator {
 
 /// Time that stands still until a test moves it. One thread.
-class ManualScheduler final : public Platform::EventScheduler {
+class ManualScheduler : public Platform::EventScheduler {
   public:
     std::uint64_t Now() override { return now; }
     EventId CallAt(std::uint64_t time, std::function<void()> event) override {

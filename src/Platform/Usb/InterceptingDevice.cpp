@@ -14,8 +14,14 @@ ErrorCode InterceptingDevice::Submit(Transfer& transfer) {
         running[&transfer] = copy;
     }
     const std::uint64_t id = copy->id;
-    BeforeSubmit(id, *copy);
-    const ErrorCode code = device->Submit(*copy);
+    ErrorCode code = Errors::Success;
+    try {
+        BeforeSubmit(id, *copy);
+        code = device->Submit(*copy);
+    } catch (...) {
+        Take(transfer);
+        throw;
+    }
     if (code != Errors::Success) {
         Take(transfer);
         Refused(id, *copy, code);
