@@ -43,21 +43,39 @@ class File final {
     const int file;
 };
 
-/// What was there, whole, or what is new, whole.
-bool ReplaceFile(const std::string& fileName, const std::vector<std::uint8_t>& content) {
-    const std::string newName = fileName + ".new-" + std::to_string(getpid());
-    bool written = false;
-    {
-        const File file(newName, O_WRONLY | O_CREAT | O_TRUNC, 0666);
-        written = file.IsOpen() && file.WriteAll(content);
+/// The error that is the reason, 0 for none.
+int WriteFile(const std::string& fileName, const std::vector<std::uint8_t>& content) {
+    const File file(fileName, O_WRONLY | O_CREAT | O_TRUNC, 0666);
+    return file.IsOpen() && file.WriteAll(content) ? 0 : errno;
+}
+
+std::string NewNameOf(const std::string& fileName) {
+    return fileName + ".new-" + std::to_string(getpid());
+}
+
+/// What was there, whole, or what is new, whole. As `WriteFile`.
+int ReplaceFile(const std::string& fileName, const std::vector<std::uint8_t>& content) {
+    const std::string newName = NewNameOf(fileName);
+    int error = WriteFile(newName, content);
+    if (error == 0 && std::rename(newName.c_str(), fileName.c_str()) != 0) {
+        error = errno;
     }
-    if (written && std::rename(newName.c_str(), fileName.c_str()) == 0) {
-        return true;
+    if (error != 0) {
+        unlink(newName.c_str());
     }
-    const int error = errno;
+    return error;
+}
+
+/// Whether a file could be replaced, as `WriteFile`; leaves it alone.
+int TryToReplace(const std::string& fileName, const std::vector<std::uint8_t>& content) {
+    const std::string newName = NewNameOf(fileName);
+    const int error = WriteFile(newName, content);
     unlink(newName.c_str());
-    errno = error;
-    return false;
+    return error;
+}
+
+std::string CannotWrite(const std::string& fileName, int error) {
+    return "cannot write " + fileName + ": " + std::strerror(error);
 }
 
 }  // namespace
@@ -99,11 +117,12 @@ bool EepromFile::Exists() const {
 }
 
 void EepromFile::Keep(std::shared_ptr<SimulatedInstrument> kept) {
-    instrument = std::move(kept);
-    if (!Exists()) {
-        unsaved = true;
-        Save();
+    const std::vector<std::uint8_t> content = kept->Eeprom();
+    const int error = Exists() ? TryToReplace(fileName, content) : ReplaceFile(fileName, content);
+    if (error != 0) {
+        throw std::runtime_error(CannotWrite(fileName, error));
     }
+    instrument = std::move(kept);
 }
 
 void EepromFile::MemoryChanged() {
@@ -125,9 +144,10 @@ bool EepromFile::Finish() {
 
 void EepromFile::Save() {
     saving = 0;
-    unsaved = !ReplaceFile(fileName, instrument->Eeprom());
+    const int error = ReplaceFile(fileName, instrument->Eeprom());
+    unsaved = error != 0;
     if (unsaved && log) {
-        log("cannot write " + fileName + ": " + std::strerror(errno));
+        log(CannotWrite(fileName, error));
     }
 }
 

@@ -26,7 +26,8 @@ class EepromFile final {
     EepromFile& operator=(const EepromFile&) = delete;
 
     bool Exists() const;
-    /// The instrument whose memory it is, from the moment on that it exists.
+    /// The instrument whose memory it is, from the moment on that it exists. Throws `std::runtime_error` with
+    /// a text for people when the file cannot be written; one that is there is left alone.
     void Keep(std::shared_ptr<SimulatedInstrument> kept);
     /// To be told by the instrument.
     void MemoryChanged();

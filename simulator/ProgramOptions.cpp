@@ -38,6 +38,9 @@ Examples:
   ostra-simulator --faults "bulk-in 0:stall; 7+:silent"
       the first bulk IN transfer stalls, and from transfer 7 on nothing answers
 
+Exit codes: 0 when it was told to end; 2 when it cannot start (an option, a file that cannot be read or, as
+that of --eeprom, written, a port that is taken) or what was written to an EEPROM is lost.
+
 Faults are written INDEX:FAULT, several separated by semicolons. INDEX counts the transfers from 0, anew each
 time that the instrument is opened; with a + behind it the fault stays from then on. In front of it may
 stand which transfers are counted instead of all: control, bulk-in, bulk-out or interrupt. The standard

@@ -95,16 +95,37 @@ TEST_F(EepromFileTest, UnusableFilesAreExplained) {
     EXPECT_THROW(ReadEepromFile(folder.Path("")), std::runtime_error);
 }
 
-TEST_F(EepromFileTest, FailureToWriteIsToldAndKeepsTheOldFile) {
-    EepromFile file(loop, folder.Path("missing/eeprom.bin"), log);
+TEST_F(EepromFileTest, AFileThatCannotBeWrittenIsRefusedAtTheStart) {
     const auto instrument = std::make_shared<SimulatedInstrument>(loop);
-    file.Keep(instrument);
+    const std::string longest(250, 'x');  // the new file beside it would have too long a name
+    Tests::WriteFile(folder.Path(longest), FreshEeprom());
+    for (const std::string& name : {std::string("missing/eeprom.bin"), longest}) {
+        EepromFile file(loop, folder.Path(name), log);
+        try {
+            file.Keep(instrument);
+            ADD_FAILURE() << name;
+        } catch (const std::runtime_error& error) {
+            EXPECT_THAT(error.what(), HasSubstr("cannot write " + folder.Path(name)));
+        }
+        file.MemoryChanged();
+        EXPECT_FALSE(file.Finish());
+    }
+    EXPECT_EQ(FreshEeprom(), ReadEepromFile(folder.Path(longest)));
+    EXPECT_EQ(1U, folder.Files().size());
+}
+
+TEST_F(EepromFileTest, FailureToWriteIsToldAndTheMemoryKept) {
+    std::filesystem::create_directory(folder.Path("removed"));
+    EepromFile file(loop, folder.Path("removed/eeprom.bin"), log);
+    file.Keep(std::make_shared<SimulatedInstrument>(loop));
+    std::filesystem::remove_all(folder.Path("removed"));
+    file.MemoryChanged();
+    EXPECT_FALSE(file.Finish());
     ASSERT_EQ(1U, complaints.size());
     EXPECT_THAT(complaints.front(), HasSubstr("cannot write"));
-    EXPECT_FALSE(file.Finish());
-    std::filesystem::create_directory(folder.Path("missing"));
-    EXPECT_TRUE(file.Finish()) << "it was kept";
-    EXPECT_EQ(FreshEeprom(), ReadEepromFile(folder.Path("missing/eeprom.bin")));
+    std::filesystem::create_directory(folder.Path("removed"));
+    EXPECT_TRUE(file.Finish());
+    EXPECT_EQ(FreshEeprom(), ReadEepromFile(folder.Path("removed/eeprom.bin")));
 }
 
 }  // namespace
