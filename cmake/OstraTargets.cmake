@@ -1,5 +1,6 @@
 # One place that says how this project's code is compiled; every target goes through one of these helpers.
 
+option(OSTRA_WERROR "Take the compiler's warnings for errors, as ./check does" OFF)
 set(OSTRA_SANITIZE "" CACHE STRING "Sanitizers to build with, as in -fsanitize= (empty: none)")
 set(CMAKE_CXX_STANDARD 20)
 set(CMAKE_CXX_STANDARD_REQUIRED ON)
@@ -25,8 +26,8 @@ target_compile_options(ostra_options INTERFACE
   # Clang also takes a name for shadowing when it repeats a field of the class that encloses a nested one.
   $<$<C_COMPILER_ID:GNU>:-Wshadow>
   -Wcast-align -Wformat=2
-  # In optimised builds the compiler's own mistakes (below) must not keep anybody from building.
-  $<$<CONFIG:Debug>:-Werror>
+  # The warnings of a compiler that nobody has tried must not keep anybody from building.
+  $<$<BOOL:${OSTRA_WERROR}>:-Werror>
   $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor -Woverloaded-virtual -Wold-style-cast -Wextra-semi>
   # When it optimises, GCC 12 sees overlaps and overruns in what std::string and std::vector do inside themselves.
   $<$<AND:$<CXX_COMPILER_ID:GNU>,$<NOT:$<CONFIG:Debug>>>:-Wno-restrict>
