@@ -53,9 +53,10 @@ class DeviceFileSystem {
                               void* output, std::uint32_t outputSize, Overlapped& record) = 0;
 
     /// The outcome of the record's transfer: true and the bytes moved, or false with the transfer's code.
-    /// `Errors::IoIncomplete` while it runs, unless `wait` is set: then it is waited for without limit.
-    /// `transferred` is set whenever the transfer has completed, also on failure: a cancelled transfer can
-    /// have moved data.
+    /// `Errors::IoIncomplete` while it runs, unless `wait` is set: then it is waited for, as long as its
+    /// driver lets it run. On Linux the USBIO behaviour ends controls after 5 s and writes after 5 s and 10
+    /// ms a byte; nothing else ends by itself. `transferred` is set whenever the transfer has completed, also
+    /// on failure: a cancelled transfer can have moved data.
     virtual bool GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) = 0;
 
     /// Asks for the end of the transfers that the calling thread started on `file`; they complete with

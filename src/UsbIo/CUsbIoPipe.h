@@ -23,7 +23,8 @@ class CUsbIoPipe : public CUsbIo {
 
     /// Waits until the buffer's transfer has completed and returns its status. Before that: `TimedOut` after
     /// `timeout`, `UserEvent` when `event` (a waitable object, may be left out) is signalled first, and the
-    /// wait's own result when the platform refuses it; the transfer then goes on.
+    /// wait's own result when the platform refuses it; the transfer then goes on. With `Infinite` a read is
+    /// waited for until it is ended, on Linux a write until its driver does so, after 5 s and 10 ms a byte.
     std::uint32_t WaitForCompletion(CUsbIoBuffer& buffer, std::uint32_t timeout,
                                     Platform::Handle event = Platform::NoHandle);
 

@@ -62,8 +62,9 @@ class CUsbIoThread : public CUsbIoPipe {
     HeldBuffer TakeFree() { return Hold(BufferPool.Get()); }
     void AppendPending(HeldBuffer buffer);
     bool HasPending() const { return firstPending != nullptr; }
-    /// Waits without limit for the first pending buffer, takes it off the list and counts and reports an
-    /// error. The transfers of this thread are cancelled when `ShutdownThread` asks for the end meanwhile.
+    /// Waits without limit (on Linux a write ends after 5 s and 10 ms a byte) for the first pending buffer,
+    /// takes it off the list and counts and reports an error. The transfers of this thread are cancelled when
+    /// `ShutdownThread` asks for the end meanwhile.
     HeldBuffer TakeCompleted();
     /// Waits for all that is pending and puts it back into the pool.
     void DrainPending();

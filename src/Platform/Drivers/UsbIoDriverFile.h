@@ -30,6 +30,7 @@ class UsbIoDriverFile final : public DriverFile {
 
     ErrorCode OutcomeOf(Usb::TransferStatus status) const override;
     ErrorCode RefusalOf(ErrorCode usbCode) const override;
+    /// 5 s for a control, 5 s and 10 ms a byte for a write, none for a read.
     std::uint32_t TimeLimitOf(const Usb::Transfer& transfer) const override;
     ErrorCode TimedOutCode() const override { return Protocol::UsbIoDriver::Status::TimedOut; }
 
