@@ -22,6 +22,9 @@ class BusRecording final : public TrafficRecording, private Platform::Usb::UsbBu
     explicit BusRecording(const std::string& file) : name(file) {}
 
     void Begin() override {
+        if (writer) {
+            return;  // the doctor opens one instrument after another
+        }
         writer.emplace(name, "ostra " OSTRA_VERSION);
         Check();
         recorded.emplace(bus, *writer);
