@@ -68,7 +68,7 @@ endfunction()
 # as several tests side by side, each with its share of the cases.
 function(ostra_test NAME)
   cmake_parse_arguments(ARG "WAITS_LONG" "" "SOURCES;LINK;EXACT_TIME" ${ARGN})
-  ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest)
+  ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest $<$<TARGET_EXISTS:ostra_virtual_time>:ostra_virtual_time>)
   target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
   if(OSTRA_SANITIZE)
     target_compile_options(${NAME} PRIVATE -O0)  # what is tested is optimised; its tests had better compile fast

@@ -7,7 +7,7 @@
 #include <string>
 
 #ifndef _WIN32
-#include "Platform/VirtualClock.h"
+#include "VirtualClock.h"
 #endif
 
 namespace Varnholt::Platform {
@@ -29,7 +29,7 @@ class EachClock : public testing::TestWithParam<int> {
     }
 
   private:
-    std::optional<VirtualClock> clock;
+    std::optional<Simulator::VirtualClock> clock;
 #else
     static constexpr int Seeds = 0;
 #endif

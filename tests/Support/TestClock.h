@@ -7,7 +7,7 @@
 
 #include "Platform/EventScheduler.h"
 #if !defined(_WIN32)
-#include "Platform/VirtualClock.h"
+#include "VirtualClock.h"
 #endif
 
 namespace Varnholt::Tests {
@@ -50,7 +50,7 @@ class TestClock final {
     }
 
   private:
-    std::optional<Platform::VirtualClock> clock;
+    std::optional<Simulator::VirtualClock> clock;
 #endif
 };
 

@@ -8,12 +8,12 @@
 #include <vector>
 
 #include "ostra.h"
-#include "Platform/VirtualClock.h"
 #include "Support/ResourceCount.h"
 #include "Support/SimulatedHost.h"
 #include "Sweeps/ExemptDevice.h"
 #include "Sweeps/FailingAllocator.h"
 #include "Utilities/Multithreading/Condition.h"
+#include "VirtualClock.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -50,7 +50,7 @@ class AllocationFailure : public testing::TestWithParam<std::tuple<Transport, st
 TEST_P(AllocationFailure, EndsInAResultCodeAndLeavesNothing) {
     const auto [transport, index] = GetParam();
     const Case& tested = Cases[index];
-    Platform::VirtualClock clock(1);
+    Simulator::VirtualClock clock(1);
     SimulatedHost host(transport);
     auto& instrument = host.Add("one");
     host.Bus().WrapDevices(

@@ -12,7 +12,6 @@
 #include <vector>
 
 #include "Platform/Threads.h"
-#include "Platform/VirtualClock.h"
 #include "Protocol/Instrument.h"
 #include "Support/SimulatedHost.h"
 #include "Sweeps/ExemptDevice.h"
@@ -20,6 +19,7 @@
 #include "UsbIo/CUsbIoReader.h"
 #include "UsbIo/CUsbIoWriter.h"
 #include "UsbIo/ScopedDeviceList.h"
+#include "VirtualClock.h"
 
 namespace Varnholt::UsbIo {
 namespace {
@@ -262,7 +262,7 @@ class UsbIoAllocation : public testing::TestWithParam<Case> {};
 
 TEST_P(UsbIoAllocation, EveryFailureIsAStatus) {
     const Case& tested = GetParam();
-    const Platform::VirtualClock clock(1);
+    const Simulator::VirtualClock clock(1);
     Tests::StartTheClocksOwnThread();
     int failures = 0;
     for (bool reached = true; reached; ++failures) {

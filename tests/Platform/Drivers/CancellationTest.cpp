@@ -12,7 +12,7 @@
 #include "Platform/Threads.h"
 #include "SimulatedBus.h"
 #if !defined(_WIN32)
-#include "Platform/VirtualClock.h"
+#include "VirtualClock.h"
 #endif
 
 namespace Varnholt::Tests {
@@ -173,7 +173,7 @@ TEST(Cancellation, LosesAndRepeatsNothingInAnySeededOrder) {
     int cutOff = 0;
     for (unsigned seed = 1; seed <= Rounds && !testing::Test::HasFailure(); ++seed) {
         SCOPED_TRACE(testing::Message() << "seed " << seed);
-        const Platform::VirtualClock clock(seed);
+        const Simulator::VirtualClock clock(seed);
         Round round(seed, PacketAMillisecond);
         round.Play();
         cutOff += round.CutOff();

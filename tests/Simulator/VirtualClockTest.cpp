@@ -9,12 +9,13 @@
 
 #include "Platform/EventScheduler.h"
 #include "Platform/Time.h"
-#include "Platform/VirtualClock.h"
 #include "TestThread.h"
+#include "VirtualClock.h"
 
 namespace Varnholt::Platform {
 namespace {
 
+using Simulator::VirtualClock;
 using testing::ElementsAre;
 using testing::HasSubstr;
 

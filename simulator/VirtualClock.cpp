@@ -1,15 +1,15 @@
-#include "Platform/VirtualClock.h"
+#include "VirtualClock.h"
 
 #include <utility>
 
-#include "Platform/Posix/VirtualTime.h"
+#include "VirtualTime.h"
 
-namespace Varnholt::Platform {
+namespace Varnholt::Simulator {
 
 class VirtualClock::Impl final {
   public:
     explicit Impl(std::uint64_t seed) : time(seed) {}
-    Posix::VirtualTime time;
+    VirtualTime time;
 };
 
 VirtualClock::VirtualClock(std::uint64_t seed) : impl(std::make_unique<Impl>(seed)) {}
@@ -24,4 +24,4 @@ void VirtualClock::HandleDeadlock(DeadlockHandler handler) {
     impl->time.HandleDeadlock(std::move(handler));
 }
 
-}  // namespace Varnholt::Platform
+}  // namespace Varnholt::Simulator

@@ -1,4 +1,4 @@
-#include "Platform/Posix/VirtualTime.h"
+#include "VirtualTime.h"
 
 #include <unistd.h>
 
@@ -6,7 +6,11 @@
 #include <cstdio>
 #include <cstdlib>
 
-namespace Varnholt::Platform::Posix {
+namespace Varnholt::Simulator {
+
+using namespace Platform;
+using namespace Platform::Posix;
+
 namespace {
 
 /// 2020-01-01 00:00:00 UTC, so that what depends on the date is repeatable as well.
@@ -298,4 +302,4 @@ std::string VirtualTime::DescribeThreads() const {
     return text;
 }
 
-}  // namespace Varnholt::Platform::Posix
+}  // namespace Varnholt::Simulator

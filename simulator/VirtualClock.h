@@ -5,7 +5,7 @@
 #include <memory>
 #include <string>
 
-namespace Varnholt::Platform {
+namespace Varnholt::Simulator {
 
 /// For tests: replaces the time of the whole platform layer by one that passes only while every thread waits.
 /// A time-out of five seconds costs microseconds, and what happens in which order is repeatable. POSIX only.
@@ -48,4 +48,4 @@ class VirtualClock final {
     const std::unique_ptr<Impl> impl;
 };
 
-}  // namespace Varnholt::Platform
+}  // namespace Varnholt::Simulator

@@ -11,9 +11,18 @@
 
 #include "Platform/Posix/Clock.h"
 #include "Platform/Posix/Kernel.h"
-#include "Platform/VirtualClock.h"
+#include "VirtualClock.h"
 
-namespace Varnholt::Platform::Posix {
+namespace Varnholt::Simulator {
+
+using Platform::EventScheduler;
+using Platform::WallTime;
+using Platform::Posix::BlockedCall;
+using Platform::Posix::Clock;
+using Platform::Posix::KernelHold;
+using Platform::Posix::Microseconds;
+using Platform::Posix::ThreadRecord;
+using Platform::Posix::WaitableObject;
 
 /// The clock behind `VirtualClock`. Its members are guarded by the kernel lock.
 ///
@@ -94,4 +103,4 @@ class VirtualTime final : public Clock, private EventScheduler {
     VirtualClock::DeadlockHandler handler;  ///< may be empty
 };
 
-}  // namespace Varnholt::Platform::Posix
+}  // namespace Varnholt::Simulator

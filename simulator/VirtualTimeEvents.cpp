@@ -3,9 +3,13 @@
 #include "Platform/ErrorCodes.h"
 #include "Platform/Posix/RealScheduler.h"
 #include "Platform/Posix/SystemThread.h"
-#include "Platform/Posix/VirtualTime.h"
+#include "VirtualTime.h"
 
-namespace Varnholt::Platform::Posix {
+namespace Varnholt::Simulator {
+
+using namespace Platform;
+using namespace Platform::Posix;
+
 namespace {
 
 class WaitingForEvent final : public BlockedCall {
@@ -106,4 +110,4 @@ void VirtualTime::ServeEvents(KernelHold& hold) {
     }
 }
 
-}  // namespace Varnholt::Platform::Posix
+}  // namespace Varnholt::Simulator
