@@ -1,10 +1,10 @@
 #pragma once
 
-#include <string>
+#include "DeviceDriver/Ostra/Transport.h"
 
 namespace Varnholt::Tests {
 
-enum class Transport { Native, UsbIo };
+using DeviceDriver::Ostra::Transport;
 
 inline const char* Name(Transport transport) {
     return transport == Transport::Native ? "native" : "usbio";

@@ -7,6 +7,7 @@
 #include "DeviceDriver/Generic/EventListener.h"
 #include "DeviceDriver/Ostra/LowLevel/DataStageObserver.h"
 #include "DeviceDriver/Ostra/LowLevel/ScanReceiver.h"
+#include "DeviceDriver/Ostra/Transport.h"
 #include "Utilities/Tools/SmartPointer.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
@@ -71,10 +72,11 @@ class PellandoFunctionalityByte {
     /// The path of the instrument's device interface.
     virtual void GetDeviceIdentifier(std::string& identifier) = 0;
 
-    /// Opens the instrument with this index over the transport of this host: USBIO where `Is64BitOS` answers
-    /// true, the instrument's own driver otherwise.
+    /// Opens the instrument with this index over the transport of this host.
     static Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionalityByte> Instance(
         Generic::EventListener* listener, std::uint32_t deviceIndex);
+    static Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionalityByte> Instance(
+        Generic::EventListener* listener, std::uint32_t deviceIndex, Transport transport);
 
   protected:
     ScanReceiver* Receiver() const { return scanReceiver; }

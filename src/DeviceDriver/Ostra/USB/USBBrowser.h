@@ -4,6 +4,7 @@
 #include <list>
 #include <string>
 
+#include "DeviceDriver/Ostra/Transport.h"
 #include "Utilities/Tools/SmartPointer.h"
 
 namespace Varnholt::DeviceDriver::Ostra::USB {
@@ -19,9 +20,9 @@ class USBBrowser {
     virtual std::list<std::string> GetDevices(const std::int32_t& selector) = 0;
     virtual bool IsAnyOstraConnected() = 0;
 
-    /// A new browser for the transport of this host: USBIO where `Is64BitOS` answers true, the instrument's
-    /// own driver otherwise.
+    /// A new browser for the transport of this host.
     static Varnholt::Utilities::Tools::SmartPointer<USBBrowser> Instance();
+    static Varnholt::Utilities::Tools::SmartPointer<USBBrowser> Instance(Transport transport);
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::USB

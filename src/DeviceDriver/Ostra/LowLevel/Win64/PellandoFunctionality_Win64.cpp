@@ -92,7 +92,7 @@ TRACED
 PellandoFunctionality_Win64::~PellandoFunctionality_Win64() = default;
 
 void PellandoFunctionality_Win64::InitUSBIO(std::uint32_t deviceIndex) try {
-    const std::list<std::string> names = USB::USBBrowser::Instance()->GetDevices(0);
+    const std::list<std::string> names = USB::USBBrowser::Instance(Transport::UsbIo)->GetDevices(0);
     if (deviceIndex >= names.size()) {
         throw IOException("No such device connected", Here(), Platform::Errors::FileNotFound);
     }
