@@ -12,8 +12,8 @@
 namespace Varnholt::Cli {
 namespace {
 
-constexpr std::size_t FilePiece = 1 << 20;
-/// What a pipe that has room takes at once.
+constexpr std::size_t LargePiece = 1 << 20;
+/// What a pipe that has room takes without waiting.
 constexpr std::size_t PipePiece = 4096;
 constexpr int LookInterval = 50;  // milliseconds
 constexpr int RetryInterval = 5;  // milliseconds
@@ -126,23 +126,32 @@ std::error_code OutputDescriptor::AwaitRoom(const Interruption& interruption) {
 
 OutputDescriptor::Outcome OutputDescriptor::Write(std::span<const char> bytes,
                                                   const Interruption& interruption) {
+    // A file takes all, and what this object has opened as much as there is room for.
+    const bool neverWaits = isFile || isOwn;
     std::size_t accepted = 0;
+    bool wasRefused = false;
     while (accepted < bytes.size()) {
-        if (!isFile) {
+        if (!neverWaits || wasRefused) {
             if (const std::error_code error = AwaitRoom(interruption)) {
                 return {accepted, error};
             }
         }
-        const std::size_t piece = std::min(bytes.size() - accepted, isFile ? FilePiece : PipePiece);
+        const std::size_t piece = std::min(bytes.size() - accepted, neverWaits ? LargePiece : PipePiece);
         const ssize_t taken = ::write(descriptor, bytes.data() + accepted, piece);
-        if (taken < 0 && errno == EAGAIN) {  // a terminal with room for less than a line end
-            if (WaitingTime(interruption) == 0) {
-                return {accepted, std::make_error_code(std::errc::operation_canceled)};
+        if (taken < 0 && errno == EAGAIN) {
+            if (wasRefused) {  // a terminal with room for less than a line end
+                if (WaitingTime(interruption) == 0) {
+                    return {accepted, std::make_error_code(std::errc::operation_canceled)};
+                }
+                ::poll(nullptr, 0, RetryInterval);
             }
-            ::poll(nullptr, 0, RetryInterval);
-        } else if (taken < 0 && errno != EINTR) {
+            wasRefused = true;
+            continue;
+        }
+        if (taken < 0 && errno != EINTR) {
             return {accepted, LastCode()};
         }
+        wasRefused = false;
         accepted += static_cast<std::size_t>(std::max<ssize_t>(taken, 0));
     }
     return {accepted, {}};
