@@ -4,7 +4,6 @@
 
 #include "Interface/Readout.h"
 #include "Memory/RamAccess.h"
-#include "Protocol/ByteOrder.h"
 #include "Protocol/PropertyIdentifiers.h"
 
 namespace Varnholt::Cli {
@@ -15,7 +14,6 @@ namespace Ids = Protocol::PropertyIds;
 namespace Fixed = Interface::FixedReadout;
 
 constexpr std::size_t ParameterCount = 4;
-constexpr std::int32_t HighestPositive = 0xF800;
 
 /// With the fixed parameters but for the time.
 void SetIntegrationTime(Instrument& instrument, double seconds) {
@@ -107,15 +105,6 @@ MeasurementFacts FactsOf(Instrument& instrument, const MeasurementOptions& optio
     }
     facts.integrationTime = facts.p1 * RamAccess(instrument).TimeUnit();
     return facts;
-}
-
-std::vector<std::int32_t> ValuesOf(std::span<const std::uint8_t> record) {
-    std::vector<std::int32_t> values;
-    for (std::size_t i = 0; i + 1 < record.size(); i += 2) {
-        const std::int32_t value = Protocol::LoadBig16(record.data() + i);
-        values.push_back(value > HighestPositive ? value - 0x10000 : value);
-    }
-    return values;
 }
 
 }  // namespace Varnholt::Cli

@@ -32,7 +32,4 @@ struct MeasurementFacts {
 /// parameters that were made of it.
 MeasurementFacts FactsOf(Instrument& instrument, const MeasurementOptions& options);
 
-/// The signed values of a record: pairs of bytes, most significant first, those above 0xF800 negative.
-std::vector<std::int32_t> ValuesOf(std::span<const std::uint8_t> record);
-
 }  // namespace Varnholt::Cli

@@ -1,25 +1,22 @@
 #include <fmt/format.h>
-#include <fmt/ostream.h>
 
 #include <limits>
-#include <optional>
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
+#include "Commands/MeasurementOutput.h"
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Measurement.h"
-#include "Output/AtomicFile.h"
 #include "Output/Json.h"
-#include "Platform/Time.h"
 #include "Protocol/Instrument.h"
+#include "ScanRecorder.h"
 #include "Utilities/Tools/Win32/SystemHelperWin.h"
 
 namespace Varnholt::Cli {
 namespace {
 
 constexpr std::uint32_t LongestRecord = 6553;
-/// The library gives a transfer of a scan at least this long beyond its time-out.
-constexpr std::uint32_t Grace = 3000;  // milliseconds
+constexpr const char* Noun = "record";
 
 struct Options {
     InstrumentOptions instrument;
@@ -28,100 +25,65 @@ struct Options {
     std::uint32_t total = 0;
     std::uint32_t records = 0;
     std::uint32_t timeout = 5;
-    bool raw = false, json = false;
+    bool raw = false, json = false, discard = false;
+    bool header = false, number = false, time = false;
     std::string output;
 };
 
-/// A scan under way: how much has come, and when something came last.
-class Watcher final {
-  public:
-    Watcher(Session& usedSession, Progress& drawn) : session(usedSession) {
-        session.Files().ObserveReads([this, &drawn](std::uint32_t bytes) {
-            received += bytes;
-            lastArrival = Platform::TickCount();
-            drawn.Update(received);
-        });
-    }
-    ~Watcher() { session.Files().ObserveReads({}); }
-    Watcher(const Watcher&) = delete;
-    Watcher& operator=(const Watcher&) = delete;
-
-    std::uint64_t Received() const { return received; }
-    std::uint32_t SilentFor() const { return Platform::TickCount() - lastArrival; }
-
-  private:
-    Session& session;
+/// How a scan ended, as its summary says it.
+struct Ending {
+    const char* how = "complete";
     std::uint64_t received = 0;
-    std::uint32_t lastArrival = Platform::TickCount();
+    double seconds = 0;
 };
 
-/// Runs the scan to its end. One that the user interrupts leaves an instrument that has been reset.
-void RunScan(Session& session, Instrument& instrument, const Options& options, std::uint32_t total) {
-    Progress progress = session.MakeProgress("scanning", total, "B");
-    Watcher watcher(session, progress);
+/// An instrument whose scan was cut off would go on streaming.
+void EndStream(Session& session, Instrument& instrument) {
+    session.Files().Resume();
     try {
-        instrument.Commands().StartScan(options.recordSize, options.timeout, total);
-    } catch (const DeviceDriver::Generic::Utilities::IOException& exception) {
-        if (session.UserInterruption().IsRequested()) {
-            session.Files().Resume();
-            instrument.Commands().Reset(Protocol::OpeningResetCode);
-            throw ToolFailure(
-                ExitCode::Interrupted,
-                fmt::format("{}: scan interrupted after {}; nothing was written", instrument.Identifier(),
-                            SizeText(static_cast<double>(watcher.Received()))));
-        }
-        const FailureReport report = Describe(std::current_exception());
-        if (report.code == ExitCode::InputOutput && watcher.SilentFor() >= options.timeout * 1000 + Grace &&
-            IsConnected(instrument.Identifier())) {
-            throw ToolFailure(
-                ExitCode::Timeout,
-                fmt::format("{}: nothing came for {:.1f} s, {} before that ({})", instrument.Identifier(),
-                            watcher.SilentFor() / 1000.0, SizeText(static_cast<double>(watcher.Received())),
-                            exception.what()),
-                "a shorter --total, or a longer --timeout");
-        }
-        throw;
+        instrument.Commands().Reset(Protocol::OpeningResetCode);
+    } catch (...) {  // what ended the scan is what counts, and the next opening resets the instrument
     }
 }
 
-/// Takes the scan's data out of the library and writes them, record by record.
-class RecordWriter final {
-  public:
-    RecordWriter(std::ostream& stream, const Options& chosen) : out(stream), options(chosen) {}
-
-    void WriteAll(Instrument& instrument) {
-        std::vector<std::uint8_t> record(options.recordSize);
-        for (;;) {
-            auto size = options.recordSize;
-            instrument.Commands().GetScanData(record.data(), size);
-            if (size == 0) {
-                return;
-            }
-            Write(std::span(record).first(size));
-        }
+/// Whether a transfer brought less than it should.
+bool IsShortfall(const std::exception_ptr& failure) {
+    try {
+        std::rethrow_exception(failure);
+    } catch (const DeviceDriver::Generic::Utilities::DeviceDriverException& exception) {
+        return exception.MissingData().has_value();
+    } catch (...) {
+        return false;
     }
-    std::uint64_t Records() const { return records; }
-    std::uint64_t Bytes() const { return bytes; }
-    std::uint64_t LeftOver() const { return leftOver; }
+}
 
-  private:
-    void Write(std::span<const std::uint8_t> record) {
-        bytes += record.size();
-        const bool isWhole = record.size() == options.recordSize;
-        records += isWhole ? 1 : 0;
-        leftOver += isWhole ? 0 : record.size();
-        if (options.raw) {
-            out.write(reinterpret_cast<const char*>(record.data()),
-                      static_cast<std::streamsize>(record.size()));
-        } else if (isWhole) {
-            fmt::print(out, "{}\n", fmt::join(ValuesOf(record), ","));
-        }
+/// Runs the scan to its end, or until less comes than should. One that ends on this side leaves an instrument
+/// that has been reset.
+void RunScan(Session& session, Instrument& instrument, const Options& options, std::uint32_t total,
+             ScanRecorder& recorder) {
+    std::exception_ptr failure;
+    instrument.Commands().SetScanReceiver(&recorder);
+    try {
+        instrument.Commands().StartScan(options.recordSize, options.timeout, total);
+    } catch (...) {
+        failure = recorder.Failure() != nullptr ? recorder.Failure() : std::current_exception();
     }
-
-    std::ostream& out;
-    const Options& options;
-    std::uint64_t records = 0, bytes = 0, leftOver = 0;
-};
+    instrument.Commands().SetScanReceiver(nullptr);
+    // A transfer that was aborted can look like one with which the instrument has stopped.
+    const bool isComplete = failure == nullptr && total > 0 && recorder.Received() == total;
+    if (session.UserInterruption().IsRequested() && !isComplete) {
+        EndStream(session, instrument);
+        throw ToolFailure(ExitCode::Interrupted, instrument.Identifier() + ": scan interrupted");
+    }
+    if (recorder.Failure() != nullptr) {
+        EndStream(session, instrument);
+    }
+    // A transfer that brought less than it should is told as what is missing of the whole scan.
+    const bool isShort = total > 0 && failure != nullptr && IsShortfall(failure);
+    if (failure != nullptr && !isShort) {
+        std::rethrow_exception(failure);
+    }
+}
 
 std::uint32_t TotalOf(const Options& options) {
     const std::uint64_t total =
@@ -144,54 +106,112 @@ std::uint32_t TotalOf(const Options& options) {
     return static_cast<std::uint32_t>(total);
 }
 
+const char* NameOf(ExitCode code) {
+    switch (code) {
+        case ExitCode::Interrupted:
+            return "interrupted";
+        case ExitCode::NoInstrument:
+            return "unplugged";
+        case ExitCode::Timeout:
+            return "timeout";
+        case ExitCode::File:
+            return "output";
+        default:
+            return "failed";
+    }
+}
+
+void PrintSummary(Session& session, const Options& options, const std::string& identifier,
+                  const RecordOutput& output, const Ending& ending, const std::string& file) {
+    session.Print({{"identifier", identifier},
+                   {"records", output.Records()},
+                   {"recordSize", options.recordSize},
+                   {"bytes", ending.received},
+                   {"seconds", ending.seconds},
+                   {"file", file.empty() ? Json() : Json(file)},
+                   {"ended", ending.how}});
+}
+
+/// Scans into the output and completes it. `ending` is kept up to date, for whoever catches a failure.
+void ScanInto(RecordOutput& output, Session& session, Instrument& instrument, const Options& options,
+              std::uint32_t total, Ending& ending) {
+    PrepareMeasurement(session, instrument, options.measurement);
+    ElapsedTime time;
+    {
+        Progress progress = session.MakeProgress("scanning", total, "B");
+        ScanRecorder recorder(
+            {options.recordSize, options.raw, options.header, {options.number, options.time}}, output,
+            [&](std::uint64_t bytes) { progress.Update(bytes); });
+        const auto note = [&] {
+            ending.received = recorder.Received();
+            ending.seconds = static_cast<double>(time.Milliseconds()) / 1000;
+        };
+        try {
+            RunScan(session, instrument, options, total, recorder);
+        } catch (...) {
+            note();
+            throw;
+        }
+        note();
+        if (ending.received < total) {
+            ending.how = "short";
+            throw ToolFailure(
+                ExitCode::InputOutput,
+                fmt::format("{}: the instrument stopped: {} of {} bytes came", instrument.Identifier(),
+                            ending.received, total),
+                "a smaller --total, or none: then the scan is as long as the instrument makes it");
+        }
+        if (const auto rest = recorder.LeftOver(); !rest.empty()) {
+            if (options.raw) {
+                output.Append({reinterpret_cast<const char*>(rest.data()), rest.size()}, 0);
+            } else {
+                session.Warn(
+                    fmt::format("the last {} bytes are no whole record and were left out", rest.size()));
+            }
+        }
+    }
+    output.Complete();
+    ending.seconds = static_cast<double>(time.Milliseconds()) / 1000;
+}
+
+void CheckForm(const Options& options) {
+    if (options.json && !GoesToFile(options.output)) {
+        throw ToolFailure(ExitCode::Usage, "--json prints on standard output, and the records go there",
+                          "write them to a file: --output FILE");
+    }
+    if (options.discard && !GoesToFile(options.output)) {
+        throw ToolFailure(ExitCode::Usage, "what is printed cannot be thrown away",
+                          "write to a file: --output FILE");
+    }
+}
+
 void Scan(Session& session, const Options& options) {
     session.UseTransport(options.instrument.transport);
     const std::uint32_t total = TotalOf(options);
-    if (options.raw && options.output.empty()) {
-        if (session.OutFacts().isTerminal) {
-            throw ToolFailure(ExitCode::Usage, "raw bytes are no use on a terminal",
-                              "write them to a file: --output FILE");
+    CheckForm(options);
+    const auto output = MakeRecordOutput(session, options.output, options.raw);
+    std::string identifier;
+    Ending ending;
+    try {
+        Instrument instrument(session, options.instrument);
+        identifier = instrument.Identifier();
+        ScanInto(*output, session, instrument, options, total, ending);
+    } catch (...) {
+        const EarlyEnd end = EndEarly(session, *output, Noun, options.discard);
+        if (options.json && !identifier.empty()) {
+            ending.how = std::string_view(ending.how) == "short" ? ending.how : NameOf(end.failure.code);
+            PrintSummary(session, options, identifier, *output, ending, end.file);
         }
-        SetStandardOutputBinary();
-    }
-    Instrument instrument(session, options.instrument);
-    std::optional<AtomicFile> file;
-    if (!options.output.empty()) {
-        file.emplace(options.output);
-    }
-    PrepareMeasurement(session, instrument, options.measurement);
-    const std::uint32_t start = Platform::TickCount();
-    RunScan(session, instrument, options, total);
-    const double seconds = (Platform::TickCount() - start) / 1000.0;
-
-    RecordWriter writer(file ? file->Stream() : session.Out(), options);
-    writer.WriteAll(instrument);
-    if (writer.Bytes() < total) {
-        throw ToolFailure(ExitCode::InputOutput,
-                          fmt::format("{}: the instrument stopped after {} of {} bytes",
-                                      instrument.Identifier(), writer.Bytes(), total),
-                          "a smaller --total, or none: then the scan is as long as the instrument makes it");
-    }
-    if (file) {
-        file->Commit();
-    }
-    if (writer.LeftOver() > 0 && !options.raw) {
-        session.Warn(
-            fmt::format("the last {} bytes are no whole record and were left out", writer.LeftOver()));
+        throw ToolFailure(end.failure.code, end.failure.message, end.failure.advice);
     }
     if (options.json) {
-        session.Print({{"identifier", instrument.Identifier()},
-                       {"records", writer.Records()},
-                       {"recordSize", options.recordSize},
-                       {"bytes", writer.Bytes()},
-                       {"seconds", seconds},
-                       {"file", options.output}});
+        PrintSummary(session, options, identifier, *output, ending, options.output);
     } else {
-        const double rate = seconds > 0 ? static_cast<double>(writer.Bytes()) / seconds : 0;
-        session.Note(fmt::format("{} record{} of {} bytes in {:.3f} s{}{}", writer.Records(),
-                                 writer.Records() == 1 ? "" : "s", options.recordSize, seconds,
+        const double rate = ending.seconds > 0 ? static_cast<double>(ending.received) / ending.seconds : 0;
+        session.Note(fmt::format("{} of {} bytes in {:.3f} s{}{}", CountText(output->Records(), Noun),
+                                 options.recordSize, ending.seconds,
                                  rate > 0 ? ", " + SizeText(rate) + "/s" : "",
-                                 file ? ", written to " + options.output : ""));
+                                 GoesToFile(options.output) ? ", written to " + options.output : ""));
     }
 }
 
@@ -217,13 +237,25 @@ void AddScan(CommandSpec app, Session& session) {
         .Type("S")
         .Between(0, 86400);
     const char* const group = "Output (default: CSV on standard output, one record a line)";
-    command.Add("-o,--output", options->output, "write to a file, which is replaced when complete")
+    command
+        .Add("-o,--output", options->output,
+             "write to a file, which is replaced when complete; -: to standard output")
         .Type("FILE")
         .Group(group);
+    command.AddFlag("--discard", options->discard, "keep nothing of a scan that ends early").Group(group);
     command.AddFlag("--raw", options->raw, "the bytes as the instrument sent them").Group(group);
-    command.AddFlag("--json", options->json, "print a summary as JSON; needs --output")
-        .Needs("--output")
+    command.AddFlag("--header", options->header, "CSV: begin with the names of the columns")
+        .Excludes("--raw")
         .Group(group);
+    command.AddFlag("--number", options->number, "CSV: a column with each record's number, from 1")
+        .Excludes("--raw")
+        .Group(group);
+    command
+        .AddFlag("--time", options->time,
+                 "CSV: a column with the seconds from the start until the record's transfer came")
+        .Excludes("--raw")
+        .Group(group);
+    command.AddFlag("--json", options->json, "print a summary as JSON; needs --output").Group(group);
     AddMeasurementOptions(command, options->measurement);
     AddInstrumentOptions(command, options->instrument);
     SetAction(command, session, options, Scan);

@@ -1,5 +1,7 @@
+#include "Output/StreamOutput.h"
 #include "Platform/EventScheduler.h"
 #include "Protocol/ByteOrder.h"
+#include "ScanRecorder.h"
 #include "ToolFixture.h"
 
 namespace Varnholt::Tests {
@@ -24,6 +26,11 @@ class ScanTest : public ToolTest {
         arguments.insert(arguments.end(), {"--raw", "--output", folder.Path("raw")});
         Succeed(arguments);
         return ReadFile(folder.Path("raw"));
+    }
+    /// For a text in which a question mark is any character.
+    static std::string RegexOf(std::string text) {
+        std::replace(text.begin(), text.end(), '?', '.');
+        return text;
     }
     /// The simulated sensor numbers its records in their last two bytes.
     static void ExpectRecordsInOrder(const std::vector<std::uint8_t>& bytes) {
@@ -58,19 +65,48 @@ TEST_P(ScanTest, OpenEndedScansEndWithTheInstrument) {
     }
 }
 
-TEST_P(ScanTest, CsvHasOneRecordALineAndTheSameNumbers) {
-    host.Add("sim", Streaming(8 * RecordSize));
+TEST_P(ScanTest, CsvHasTheNumbersAndTheColumnsThatAreAskedFor) {
+    host.Add("sim", Streaming(8 * RecordSize, 2048));
     const auto bytes = ScanRaw({});
-    host.Add("sim", Streaming(8 * RecordSize));
-    Succeed({"scan"});
-    ASSERT_EQ(tool.Lines().size(), 8u);
-    std::string first;
+    std::string values, names;
     for (std::size_t i = 0; i < RecordSize; i += 2) {
         const int value = Protocol::LoadBig16(bytes.data() + i);
-        first += (i > 0 ? "," : "") + std::to_string(value > 0xF800 ? value - 0x10000 : value);
+        values += (i > 0 ? "," : "") + std::to_string(value > 0xF800 ? value - 0x10000 : value);
+        names += (i > 0 ? "," : "") + std::to_string(i / 2);
     }
-    EXPECT_EQ(tool.Lines()[0], first);
-    EXPECT_THAT(tool.Err(), HasSubstr("8 records of 256 bytes"));
+    // The first transfer holds two records, or all of them.
+    const std::string when = GetParam() == Transport::Native ? "0.2??," : "1.0??,";
+    struct Case {
+        Arguments options;
+        std::string head, first;
+    };
+    for (const Case& row : {
+             Case{{}, "", values},
+             Case{{"--output", "-"}, "", values},
+             Case{{"--header"}, names, values},
+             Case{{"--header", "--number"}, "record," + names, "1," + values},
+             Case{{"--header", "--time"}, "seconds," + names, when + values},
+             Case{{"--number", "--time"}, "", "1," + when + values},
+         }) {
+        host.Add("sim", Streaming(8 * RecordSize, 2048));
+        Arguments arguments = row.options;
+        arguments.insert(arguments.begin(), "scan");
+        Succeed(arguments);
+        EXPECT_THAT(tool.Err(), HasSubstr("8 records of 256 bytes"));
+        auto lines = tool.Lines();
+        if (!row.head.empty()) {
+            ASSERT_FALSE(lines.empty());
+            EXPECT_EQ(lines.front(), row.head);
+            lines.erase(lines.begin());
+        }
+        ASSERT_EQ(lines.size(), 8u);
+        EXPECT_THAT(lines.front(), testing::MatchesRegex(RegexOf(row.first)));
+    }
+    for (const char* column : {"--header", "--number", "--time"}) {
+        Fail({"scan", "--raw", column}, ExitCode::Usage);
+    }
+    Fail({"scan", "--json", "--output", "-"}, ExitCode::Usage);
+    Fail({"scan", "--discard"}, ExitCode::Usage);
 }
 
 TEST_P(ScanTest, OtherRecordSizes) {
@@ -89,69 +125,110 @@ TEST_P(ScanTest, SummaryAsJson) {
     Succeed({"scan", "--json", "--output", folder.Path("csv")});
     EXPECT_EQ(tool.Json()["records"], 16);
     EXPECT_EQ(tool.Json()["bytes"], 4096);
+    EXPECT_EQ(tool.Json()["file"], folder.Path("csv"));
+    EXPECT_EQ(tool.Json()["ended"], "complete");
     EXPECT_EQ(tool.Err(), "");
 }
 
 TEST_P(ScanTest, ProgressOnATerminalOnly) {
-    tool.errFacts.movesCursor = true;
+    tool.errFacts.isTerminal = tool.errFacts.movesCursor = true;
     host.Add("sim", Streaming(1'000'000));
     Succeed({"scan", "--total", "512000", "--output", folder.Path("csv")});
     EXPECT_THAT(tool.Err(), HasSubstr("512.0 kB of 512.0 kB"));
 }
 
-/// Be it that a transfer fails, or that the instrument stops too early.
-TEST_P(ScanTest, AFailedScanLeavesTheFileThatWasThere) {
-    WriteFile(folder.Path("csv"), {1});
-    for (const char* faults : {"bulk-in 5:stall", ""}) {
-        host.Add("sim", Streaming(25'600));
-        SetFaults(faults);
-        Fail({"scan", "--total", "1024000", "--output", folder.Path("csv")}, ExitCode::InputOutput);
-        EXPECT_EQ(ReadFile(folder.Path("csv")), std::vector<std::uint8_t>{1});
-        EXPECT_EQ(folder.Files().size(), 1u);
+/// Whatever ends a scan too early: what came is kept, as whole records and beside a file that was there, and
+/// the exit code and the text say why it ended. The instrument can be used afterwards.
+TEST_P(ScanTest, WhatCameIsKept) {
+    struct Case {
+        const char* name;
+        const char* faults;
+        std::function<void(Cli::Interruption& user)> event;  ///< after 5 s
+        ExitCode code;
+        const char* ended;
+        const char* text;
+        bool hasRecords = true;
+    };
+    const std::vector<Case> cases{
+        {"interrupted", "", [](auto& user) { user.Request(); }, ExitCode::Interrupted, "interrupted",
+         "scan interrupted; "},
+        {"unplugged", "", [this](auto&) { host.Bus().Unplug("sim"); }, ExitCode::NoInstrument, "unplugged",
+         ""},
+        {"silent", "bulk-in 4+:silent", {}, ExitCode::Timeout, "timeout", ""},
+        {"silent at once",
+         "bulk-in 0+:silent",
+         {},
+         ExitCode::Timeout,
+         "timeout",
+         "; nothing was recorded",
+         false},
+        {"failed", "bulk-in 4:stall", {}, ExitCode::InputOutput, "failed", ""},
+        {"short", "bulk-in 4:short=1000", {}, ExitCode::InputOutput, "short", " of 6400000 bytes came; "},
+    };
+    for (const Case& row : cases) {
+        for (const char* kind : {"new", "there", "discarded", "open-ended"}) {
+            const std::string how = kind;
+            if (how == "open-ended" && std::string(row.ended) == "short") {
+                continue;  // it is as long as the instrument makes it
+            }
+            SCOPED_TRACE(std::string(row.name) + ", " + kind);
+            auto& instrument = host.Add("sim", Streaming(100'000'000, 100'000));
+            SetFaults(row.faults);
+            if (how == "there") {
+                WriteFile(folder.Path("raw"), {1});
+            }
+            Cli::Interruption interruption;
+            tool.interruption = &interruption;
+            const auto event = After(5'000'000, [&] { row.event ? row.event(interruption) : void(); });
+            Arguments arguments{"scan", "--raw", "--json", "--timeout", "2", "--output", folder.Path("raw")};
+            if (how == "discarded") {
+                arguments.push_back("--discard");
+            }
+            if (how != "open-ended") {
+                arguments.insert(arguments.end(), {"--records", "25000"});
+            }
+            const Stopwatch watch(clock);
+            Fail(arguments, row.code, row.text);
+            watch.ExpectAtMost(row.code == ExitCode::Interrupted ? 5'100 : 25'000);
+            Platform::ClockScheduler().Forget(event);
+            EXPECT_EQ(tool.Json()["ended"], row.ended);
+
+            const bool isKept = row.hasRecords && how != "discarded";
+            const std::string kept = folder.Path(how == "there" ? "raw.part" : "raw");
+            EXPECT_EQ(tool.Json()["file"], isKept ? nlohmann::json(kept) : nlohmann::json());
+            if (isKept) {
+                const auto bytes = ReadFile(kept);
+                EXPECT_GT(bytes.size(), 0u);
+                EXPECT_EQ(bytes.size(), tool.Json()["records"].get<std::size_t>() * RecordSize);
+                EXPECT_LT(tool.Json()["bytes"].get<std::size_t>() - bytes.size(), RecordSize);
+                ExpectRecordsInOrder(bytes);
+                EXPECT_THAT(tool.Err(), HasSubstr(std::to_string(bytes.size() / RecordSize) +
+                                                  " records were written to " + kept));
+                std::filesystem::remove(kept);
+            }
+            EXPECT_EQ(folder.Files().size(), how == "there" ? 1u : 0u);
+            if (how == "there") {
+                EXPECT_EQ(ReadFile(folder.Path("raw")), std::vector<std::uint8_t>{1});
+                std::filesystem::remove(folder.Path("raw"));
+            }
+            EXPECT_EQ(instrument.PendingTransfers(), 0u);
+            EXPECT_FALSE(instrument.Claimed());
+            tool.interruption = nullptr;
+            if (std::string(row.name) == "interrupted") {
+                EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 2u);
+                Succeed({"readout"});
+            }
+        }
     }
-    Succeed({"scan", "--total", "10240"});
 }
 
-TEST_P(ScanTest, AnInstrumentThatFallsSilentIsATimeout) {
-    host.Add("sim", Streaming(10'000'000));
-    SetFaults("bulk-in 1+:silent");
-    for (const std::vector<std::string>& kind :
-         {std::vector<std::string>{"scan", "--timeout", "2"},
-          std::vector<std::string>{"scan", "--timeout", "2", "--total", "1024000"}}) {
-        const Stopwatch watch(clock);
-        EXPECT_EQ(tool.Run(kind), ExitCode::Timeout) << tool.Err();
-        watch.ExpectAtMost(20'000);
-    }
-}
-
-TEST_P(ScanTest, AnUnpluggedInstrumentIsSaidToBe) {
-    host.Add("sim", Streaming(100'000'000, 1'000'000));
-    After(5'000'000, [&] { host.Bus().Unplug("sim"); });
-    Fail({"scan"}, ExitCode::NoInstrument, Identifier());
-}
-
-TEST_P(ScanTest, CtrlCEndsAScanAndLeavesTheInstrumentUsable) {
+TEST_P(ScanTest, OutputThatCannotBeWrittenEndsAScan) {
     auto& instrument = host.Add("sim", Streaming(100'000'000, 100'000));
-    WriteFile(folder.Path("csv"), {1});
-    for (const std::vector<std::string>& kind :
-         {std::vector<std::string>{"scan"}, std::vector<std::string>{"scan", "--total", "89600000"}}) {
-        Cli::Interruption interruption;
-        tool.interruption = &interruption;
-        const auto resets = instrument.WithCommands([](const auto& commands) { return commands.resets; });
-        const Stopwatch watch(clock);
-        After(10'000'000, [&] { interruption.Request(); });
-        Arguments arguments = kind;
-        arguments.insert(arguments.end(), {"--output", folder.Path("csv")});
-        EXPECT_EQ(tool.Run(arguments), ExitCode::Interrupted) << tool.Err();
-        watch.ExpectBetween(10'000, 12'500);
-        EXPECT_THAT(tool.Err(), HasSubstr("scan interrupted after "));
-        EXPECT_EQ(ReadFile(folder.Path("csv")), std::vector<std::uint8_t>{1});
-        EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), resets + 2);
-        EXPECT_EQ(instrument.PendingTransfers(), 0u);
-        EXPECT_FALSE(instrument.Claimed());
-    }
-    tool.interruption = nullptr;
-    Succeed({"readout"});
+    tool.CloseOut();
+    const Stopwatch watch(clock);
+    Fail({"scan"}, ExitCode::File, "the output cannot be written");
+    watch.ExpectAtMost(2'000);
+    EXPECT_EQ(instrument.PendingTransfers(), 0u);
 }
 
 /// Wherever it comes: while the instrument is opened, waited for, scanned, closed.
@@ -159,22 +236,67 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
     host.Add("sim", Streaming(102'400, 40'000));
     int interrupted = 0;
     for (std::uint64_t after = 0; after < 4'000; after += 100) {
+        SCOPED_TRACE(after);
         Cli::Interruption interruption;
         tool.interruption = &interruption;
         const auto event = After(after * 1000, [&] { interruption.Request(); });
         const Stopwatch watch(clock);
-        const ExitCode code = tool.Run({"scan", "--output", folder.Path("csv")});
+        const ExitCode code = tool.Run({"scan", "--raw", "--output", folder.Path("raw")});
         Platform::ClockScheduler().Forget(event);
         constexpr std::uint32_t ending = 50;
         watch.ExpectAtMost(code == ExitCode::Interrupted ? static_cast<std::uint32_t>(after) + ending
                                                          : 8'000);
-        ASSERT_TRUE(code == ExitCode::Interrupted || code == ExitCode::Success)
-            << after << ": " << tool.Err();
+        ASSERT_TRUE(code == ExitCode::Interrupted || code == ExitCode::Success) << tool.Err();
         interrupted += code == ExitCode::Interrupted ? 1 : 0;
+        for (const std::string& name : folder.Files()) {
+            EXPECT_EQ(name, "raw");
+            const auto bytes = ReadFile(folder.Path(name));
+            EXPECT_GT(bytes.size(), 0u);
+            EXPECT_EQ(bytes.size() % RecordSize, 0u);
+            ExpectRecordsInOrder(bytes);
+            std::filesystem::remove(folder.Path(name));
+        }
     }
     EXPECT_GT(interrupted, 20);
     tool.interruption = nullptr;
     Succeed({"scan", "--output", folder.Path("csv")});
+}
+
+/// However the data are cut into transfers.
+TEST(ScanRecorderTest, RecordsArePutTogetherFromTransfers) {
+    std::vector<std::uint8_t> data(100'001);
+    for (std::size_t i = 0; i < data.size(); ++i) {
+        data[i] = static_cast<std::uint8_t>(i * i / 7 + i / 251);
+    }
+    for (const std::uint32_t recordSize : {2u, 8u, 254u, 6552u}) {
+        std::string raw(data.begin(),
+                        data.begin() + static_cast<std::ptrdiff_t>(data.size() / recordSize * recordSize));
+        std::string csv;
+        for (std::size_t i = 0; i < raw.size(); i += 2) {
+            const int value = Protocol::LoadBig16(data.data() + i);
+            csv += i % recordSize == 0 ? std::to_string(i / recordSize + 1) + ',' : "";
+            csv += std::to_string(value > 0xF800 ? value - 0x10000 : value);
+            csv += (i + 2) % recordSize == 0 ? '\n' : ',';
+        }
+        for (const bool isRaw : {false, true}) {
+            for (const std::size_t transfer : {1u, 3u, 255u, 256u, 4096u, 100'001u}) {
+                SCOPED_TRACE(std::to_string(recordSize) + " from " + std::to_string(transfer));
+                std::ostringstream stream;
+                Cli::StreamOutput output(stream);
+                std::uint64_t told = 0;
+                Cli::ScanRecorder recorder({recordSize, isRaw, false, {true, false}}, output,
+                                           [&told](std::uint64_t bytes) { told = bytes; });
+                for (std::size_t i = 0; i < data.size(); i += transfer) {
+                    recorder.Receive(std::span(data).subspan(i, std::min(transfer, data.size() - i)));
+                }
+                EXPECT_EQ(stream.str(), isRaw ? raw : csv);
+                EXPECT_EQ(output.Records(), data.size() / recordSize);
+                EXPECT_EQ(recorder.LeftOver().size(), data.size() % recordSize);
+                EXPECT_EQ(recorder.Received(), data.size());
+                EXPECT_GT(told, data.size() - recordSize);
+            }
+        }
+    }
 }
 
 }  // namespace

@@ -1,0 +1,76 @@
+#include <benchmark/benchmark.h>
+#include <fmt/format.h>
+#include <fmt/ostream.h>
+
+#include <ctime>
+#include <fstream>
+#include <vector>
+
+#include "Interruption.h"
+#include "Output/RecordingFile.h"
+#include "Protocol/ByteOrder.h"
+#include "ScanRecorder.h"
+#include "SensorModel.h"
+
+namespace Varnholt::Bench {
+namespace {
+
+constexpr std::size_t RecordSize = 256;
+constexpr std::size_t TransferSize = 65536;
+
+double CpuSeconds() {
+    timespec time{};
+    clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &time);
+    return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_nsec) * 1e-9;
+}
+
+std::vector<std::uint8_t> Transfer() {
+    const Simulator::SensorModel sensor(1, 1, 1);
+    std::vector<std::uint8_t> bytes(TransferSize);
+    for (std::size_t i = 0; i < TransferSize / RecordSize; ++i) {
+        sensor.Read({19'992, 1}, 1, static_cast<std::uint32_t>(i),
+                    Simulator::SensorModel::Record(bytes.data() + i * RecordSize, RecordSize));
+    }
+    return bytes;
+}
+
+/// The way that `ostra scan` does not go: formatted lists of values into a stream.
+void WriteStreamed(std::ostream& out, std::span<const std::uint8_t> transfer) {
+    for (std::size_t i = 0; i < transfer.size(); i += RecordSize) {
+        std::vector<std::int32_t> values;
+        for (std::size_t j = i; j < i + RecordSize; j += 2) {
+            const std::int32_t value = Protocol::LoadBig16(transfer.data() + j);
+            values.push_back(value > 0xF800 ? value - 0x10000 : value);
+        }
+        fmt::print(out, "{}\n", fmt::join(values, ","));
+    }
+}
+
+/// Records as CSV to where nothing is kept, against the streamed way, in turns. Processor time.
+void ScanCsv(benchmark::State& state) {
+    const std::vector<std::uint8_t> transfer = Transfer();
+    std::ofstream stream("/dev/null", std::ios::binary);
+    Cli::Interruption none;
+    Cli::RecordingFile file("/dev/null", none);
+    Cli::ScanRecorder recorder({RecordSize, false, false, {}}, file, [](std::uint64_t) {});
+    double streamed = 0;
+    double recorded = 0;
+    for (auto _ : state) {
+        const double begin = CpuSeconds();
+        WriteStreamed(stream, transfer);
+        const double middle = CpuSeconds();
+        recorder.Receive(transfer);
+        const double end = CpuSeconds();
+        streamed += middle - begin;
+        recorded += end - middle;
+        state.SetIterationTime(end - middle);
+    }
+    const double megabytes = static_cast<double>(state.iterations()) * TransferSize / 1e6;
+    state.counters["streamed_s_per_256MB"] = streamed / megabytes * 256;
+    state.counters["recorded_s_per_256MB"] = recorded / megabytes * 256;
+    state.counters["times_faster"] = streamed / recorded;
+}
+BENCHMARK(ScanCsv)->UseManualTime()->Unit(benchmark::kMicrosecond);
+
+}  // namespace
+}  // namespace Varnholt::Bench

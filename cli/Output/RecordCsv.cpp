@@ -1,0 +1,72 @@
+#include "Output/RecordCsv.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <charconv>
+#include <cstring>
+
+#include "Protocol/ByteOrder.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+constexpr std::int32_t HighestPositive = 0xF800;
+constexpr std::size_t LongestValue = 6;    // and a comma or the line's end
+constexpr std::size_t LongestNumber = 21;  // and a comma
+
+}  // namespace
+
+std::vector<RecordCsv::Cell> RecordCsv::MakeCells() {
+    std::vector<Cell> made(0x10000);
+    for (std::int32_t i = 0; i < 0x10000; ++i) {
+        Cell& cell = made[static_cast<std::size_t>(i)];
+        char* const begin = cell.text.data();
+        char* const end =
+            std::to_chars(begin, begin + cell.text.size(), i > HighestPositive ? i - 0x10000 : i).ptr;
+        *end = ',';
+        cell.length = static_cast<std::uint8_t>(end + 1 - begin);
+    }
+    return made;
+}
+
+RecordCsv::RecordCsv(std::size_t recordSize, CsvColumns chosenColumns)
+    : size(recordSize),
+      columns(chosenColumns),
+      longestLine(2 * LongestNumber + recordSize / 2 * LongestValue) {}
+
+std::string RecordCsv::Head() const {
+    std::string head;
+    head += columns.number ? "record," : "";
+    head += columns.seconds ? "seconds," : "";
+    for (std::size_t i = 0; i < size / 2; ++i) {
+        head += std::to_string(i) + ',';
+    }
+    head.back() = '\n';
+    return head;
+}
+
+std::span<const char> RecordCsv::Lines(std::span<const std::uint8_t> records, std::uint64_t number,
+                                       std::uint64_t milliseconds) {
+    text.resize(std::max(text.size(), records.size() / size * longestLine + sizeof(Cell)));
+    const std::string seconds =
+        columns.seconds ? fmt::format("{}.{:03},", milliseconds / 1000, milliseconds % 1000) : "";
+    char* at = text.data();
+    char* const end = at + text.size();
+    for (std::size_t i = 0; i < records.size(); i += size) {
+        if (columns.number) {
+            at = std::to_chars(at, end, number++).ptr;
+            *at++ = ',';
+        }
+        at = std::copy(seconds.begin(), seconds.end(), at);
+        for (std::size_t j = i; j < i + size; j += 2) {
+            const Cell& cell = cells[Protocol::LoadBig16(records.data() + j)];
+            std::memcpy(at, &cell, sizeof(cell));  // what is too much is written over
+            at += cell.length;
+        }
+        at[-1] = '\n';
+    }
+    return std::span<const char>(text).first(static_cast<std::size_t>(at - text.data()));
+}
+
+}  // namespace Varnholt::Cli
