@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <new>
-#include <utility>
 
 #include "Protocol/ByteOrder.h"
 #include "Protocol/Instrument.h"
@@ -54,12 +53,6 @@ void InterruptibleDeviceFiles::Interrupt() {
 
 void InterruptibleDeviceFiles::Resume() {
     interrupted = false;
-}
-
-void InterruptibleDeviceFiles::ObserveReads(ReadObserver readObserver) {
-    const CriticalSection::Holder holder(section);
-    observer = std::move(readObserver);
-    observed = std::this_thread::get_id();
 }
 
 const std::string& InterruptibleDeviceFiles::PathOf(Handle file) const {
@@ -151,13 +144,13 @@ bool InterruptibleDeviceFiles::Refuse(Overlapped& record, ErrorCode code) {
 
 /// The section is held over the start, so that no transfer slips in behind an interruption.
 template <class Start>
-bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, bool isRead, Start start) try {
+bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, Start start) try {
     const CriticalSection::Holder holder(section);
     if (interrupted) {
         return Refuse(record, Errors::OperationAborted);
     }
     std::erase_if(running, [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
-    running.push_back({&record, file, isRead, std::this_thread::get_id()});
+    running.push_back({&record, file});
     const bool completed = start();
     if (!completed && LastError() != Errors::IoPending) {
         const ErrorCode code = LastError();
@@ -171,12 +164,12 @@ bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, bo
 
 bool InterruptibleDeviceFiles::StartRead(Handle file, void* buffer, std::uint32_t length,
                                          Overlapped& record) {
-    return StartTransfer(file, record, true, [&] { return below.StartRead(file, buffer, length, record); });
+    return StartTransfer(file, record, [&] { return below.StartRead(file, buffer, length, record); });
 }
 
 bool InterruptibleDeviceFiles::StartWrite(Handle file, const void* buffer, std::uint32_t length,
                                           Overlapped& record) {
-    return StartTransfer(file, record, false, [&] { return below.StartWrite(file, buffer, length, record); });
+    return StartTransfer(file, record, [&] { return below.StartWrite(file, buffer, length, record); });
 }
 
 bool InterruptibleDeviceFiles::StartControl(Handle file, std::uint32_t code, const void* input,
@@ -194,21 +187,10 @@ bool InterruptibleDeviceFiles::GetResult(Handle file, Overlapped& record, std::u
     if (!succeeded && code == Errors::IoIncomplete) {
         return false;
     }
-    ReadObserver call;
     {
         const CriticalSection::Holder holder(section);
-        const auto found =
-            std::find_if(running.begin(), running.end(),
-                         [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
-        if (found != running.end()) {
-            if (succeeded && found->isRead && found->starter == observed && transferred > 0) {
-                call = observer;
-            }
-            running.erase(found);
-        }
-    }
-    if (call) {
-        call(transferred);
+        std::erase_if(running,
+                      [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
     }
     SetLastError(code);
     return succeeded;

@@ -2,9 +2,7 @@
 
 #include <atomic>
 #include <cstdint>
-#include <functional>
 #include <string>
-#include <thread>
 #include <vector>
 
 #include "Platform/DeviceFiles.h"
@@ -35,11 +33,6 @@ class InterruptibleDeviceFiles final : public DeviceFileSystem {
     void Resume();
     bool IsInterrupted() const { return interrupted.load(); }
 
-    /// Called on the calling thread, for each read of that thread that brought data, with the number of
-    /// bytes. An empty function ends that. Not while reads of the thread run.
-    using ReadObserver = std::function<void(std::uint32_t bytes)>;
-    void ObserveReads(ReadObserver observer);
-
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
     Handle Open(const std::string& path) override;
     bool CloseFile(Handle file) override;
@@ -58,12 +51,10 @@ class InterruptibleDeviceFiles final : public DeviceFileSystem {
     struct RunningTransfer {
         const Overlapped* record;
         Handle file;
-        bool isRead;
-        std::thread::id starter;
     };
 
     template <class Start>
-    bool StartTransfer(Handle file, Overlapped& record, bool isRead, Start start);
+    bool StartTransfer(Handle file, Overlapped& record, Start start);
     static bool Refuse(Overlapped& record, ErrorCode code);
     void AbortPipe(Handle file);
     void Control(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize);
@@ -75,8 +66,6 @@ class InterruptibleDeviceFiles final : public DeviceFileSystem {
     CriticalSection section;
     std::vector<OpenedFile> files;
     std::vector<RunningTransfer> running;
-    ReadObserver observer;
-    std::thread::id observed;
 };
 
 }  // namespace Varnholt::Platform
