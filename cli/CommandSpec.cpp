@@ -94,7 +94,7 @@ CommandSpec CommandSpec::AddGroup(const char* name, const char* about) {
 template <class Target>
 CLI::Option* CommandSpec::AddOption(const char* names, Target& target, const char* about) {
     CLI::Option* const option = command->add_option(names, target, about);
-    if (option->get_positional()) {
+    if (option->get_positional() && option->get_lnames().empty()) {
         option->type_name("");  // its name says what it is
     }
     return option;

@@ -53,7 +53,7 @@ std::string Session::Paint(const char* color, const std::string& text) const {
 }
 
 void Session::Print(const nlohmann::ordered_json& value) {
-    PrintJson(where.out, value);
+    PrintJson(Out(), value);
 }
 
 void Session::FlushOut() {
@@ -62,6 +62,29 @@ void Session::FlushOut() {
         interruption.ThrowIfRequested();
         throw ToolFailure(ExitCode::File, "the output cannot be written");
     }
+}
+
+void Session::ClaimOut() {
+    if (where.outFacts.isTerminal) {
+        throw ToolFailure(ExitCode::Usage, "raw bytes are no use on a terminal",
+                          "write them to a file, or into a pipe");
+    }
+    SetStandardOutputBinary();
+    outIsClaimed = true;
+}
+
+void Session::WriteClaimedOut(std::span<const std::uint8_t> content) {
+    where.out.write(reinterpret_cast<const char*>(content.data()),
+                    static_cast<std::streamsize>(content.size()));
+    FlushOut();
+}
+
+void Session::ClaimIn() {
+    if (inIsClaimed) {
+        throw ToolFailure(ExitCode::Usage, "standard input can be only one file",
+                          "give the other one a name");
+    }
+    inIsClaimed = true;
 }
 
 void Session::Note(const std::string& text) {

@@ -5,6 +5,7 @@
 #include <memory>
 #include <nlohmann/json_fwd.hpp>
 #include <optional>
+#include <span>
 #include <string>
 
 #include "Failure.h"
@@ -22,6 +23,8 @@ struct Surroundings {
     std::ostream& err;
     StreamFacts outFacts;
     StreamFacts errFacts;
+    /// How long a pipe that is read may bring nothing.
+    std::uint32_t inputPatience = 30'000;  // milliseconds
 };
 
 class TrafficRecording;
@@ -35,11 +38,20 @@ class Session final {
     Session(const Session&) = delete;
     Session& operator=(const Session&) = delete;
 
-    std::ostream& Out() { return where.out; }
+    /// For results: standard output, or standard error once `ClaimOut` was called.
+    std::ostream& Out() { return outIsClaimed ? where.err : where.out; }
     const StreamFacts& OutFacts() const { return where.outFacts; }
     void Print(const nlohmann::ordered_json& value);
     /// What is in `Out` is on its way; throws where it cannot be written.
     void FlushOut();
+
+    /// Standard output carries the bytes of a file from now on. Throws where it is a terminal.
+    void ClaimOut();
+    /// Bytes for standard output, on their way when this returns; throws where it cannot be written.
+    void WriteClaimedOut(std::span<const std::uint8_t> content);
+    /// Standard input is read as a file. Throws where that has happened already.
+    void ClaimIn();
+    std::uint32_t InputPatience() const { return where.inputPatience; }
 
     /// Messages, on standard error.
     void Note(const std::string& text);
@@ -79,6 +91,8 @@ class Session final {
     std::optional<Platform::ScopedDeviceFiles> filesInForce;
     const std::optional<bool> transportBefore;
     std::string instrumentInUse;
+    bool outIsClaimed = false;
+    bool inIsClaimed = false;
 };
 
 }  // namespace Varnholt::Cli

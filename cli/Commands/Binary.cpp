@@ -2,7 +2,7 @@
 #include "Commands/CommonOptions.h"
 #include "Memory/ImageEdit.h"
 #include "Memory/MemoryTarget.h"
-#include "Output/AtomicFile.h"
+#include "Memory/NewFile.h"
 #include "Output/Json.h"
 #include "Protocol/EepromMap.h"
 
@@ -11,17 +11,18 @@ namespace {
 
 struct GetOptions {
     MemoryOptions memory;
-    std::string file;
+    NewFileOptions file;
 };
 
 void Get(Session& session, const GetOptions& options) {
+    const NewFile file(session, options.file);
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
     const std::vector<std::uint8_t> block = BinaryBlockOf(target.Image());
-    WriteFileAtomically(options.file, block);
+    file.Write(block);
     if (options.memory.json) {
-        session.Print({{"source", target.Name()}, {"file", options.file}, {"bytes", block.size()}});
+        session.Print({{"source", target.Name()}, {"file", options.file.name}, {"bytes", block.size()}});
     } else {
-        session.Out() << block.size() << " bytes of " << target.Name() << " written to " << options.file
+        session.Out() << block.size() << " bytes of " << target.Name() << " written to " << file.ShownName()
                       << '\n';
     }
 }
@@ -34,7 +35,7 @@ struct PutOptions {
 
 void Put(Session& session, const PutOptions& options) {
     const std::vector<std::uint8_t> block =
-        ReadFileOfSize(options.file, Protocol::EepromMap::BinarySize, "a binary block",
+        ReadFileOfSize(session, options.file, Protocol::EepromMap::BinarySize, "a binary block",
                        "`ostra binary get FILE` saves the one of an instrument");
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     const MemoryTarget::Outcome outcome =
@@ -49,13 +50,13 @@ void AddBinary(CommandSpec app, Session& session) {
 
     const auto get = std::make_shared<GetOptions>();
     CommandSpec command = group.AddCommand("get", "save the binary block in a file");
-    command.Add("FILE", get->file, "is replaced when complete").Required();
+    AddNewFileOptions(command, "FILE", get->file);
     AddMemoryOptions(command, get->memory);
     SetAction(command, session, get, Get);
 
     const auto put = std::make_shared<PutOptions>();
     command = group.AddCommand("put", "write the binary block from a file");
-    command.Add("FILE", put->file, "1904 bytes").Required();
+    command.Add("FILE", put->file, "1904 bytes; `-` is standard input").Required();
     AddChangeOptions(command, put->change);
     AddMemoryOptions(command, put->memory);
     SetAction(command, session, put, Put);

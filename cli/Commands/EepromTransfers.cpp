@@ -3,38 +3,39 @@
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
 #include "Commands/Eeprom.h"
+#include "Memory/ByteSource.h"
 #include "Memory/ImageCheck.h"
 #include "Memory/ImageModel.h"
 #include "Memory/MemoryTarget.h"
-#include "Output/AtomicFile.h"
+#include "Memory/NewFile.h"
 #include "Output/Json.h"
-#include "Terminal.h"
 
 namespace Varnholt::Cli {
 namespace {
 
 struct BackupOptions {
     MemoryOptions memory;
-    std::string file;
+    NewFileOptions file;
 };
 
 void Backup(Session& session, const BackupOptions& options) {
+    const NewFile file(session, options.file);
     Instrument instrument(session, options.memory.instrument);
     const EepromImage image = ReadEepromTwice(session, instrument);
-    WriteFileAtomically(options.file, image);
+    file.Write(image);
     const bool isSane = IsSane(CheckImage(image));
     if (!isSane) {
         session.Warn("the EEPROM holds what the driver cannot use; `ostra eeprom check " +
-                     QuotedFileName(options.file) + "` says what");
+                     QuotedSource(options.file.name) + "` says what");
     }
     if (options.memory.json) {
         session.Print({{"identifier", instrument.Identifier()},
-                       {"file", options.file},
+                       {"file", options.file.name},
                        {"bytes", image.size()},
                        {"sane", isSane}});
     } else {
         session.Out() << instrument.Identifier() << ": " << image.size() << " bytes written to "
-                      << options.file << '\n';
+                      << file.ShownName() << '\n';
     }
 }
 
@@ -57,15 +58,15 @@ void CheckBeforeWriting(Session& session, const WriteOptions& options, const Eep
         return;
     }
     if (!options.force) {
-        throw ToolFailure(ExitCode::BadData, options.file + " is not written: " + errors,
-                          "`ostra eeprom check " + QuotedFileName(options.file) +
+        throw ToolFailure(ExitCode::BadData, ShownSource(options.file) + " is not written: " + errors,
+                          "`ostra eeprom check " + QuotedSource(options.file) +
                               "` tells all; --force writes it all the same");
     }
-    session.Warn(options.file + ": " + errors);
+    session.Warn(ShownSource(options.file) + ": " + errors);
 }
 
 void WriteOrRestore(Session& session, const WriteOptions& options, const ChangeOptions& change) {
-    const EepromImage image = ReadImageFile(options.file);
+    const EepromImage image = ReadImageFile(session, options.file);
     CheckBeforeWriting(session, options, image);
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     const MemoryTarget::Outcome outcome = target.Change(image, change, Granularity::Pieces);
@@ -85,16 +86,19 @@ void Restore(Session& session, const WriteOptions& options) {
 
 void New(Session& session, const BackupOptions& options) {
     const EepromImage image = FreshImage();
-    WriteFileAtomically(options.file, image);
+    const NewFile file(session, options.file);
+    file.Write(image);
     if (options.memory.json) {
-        session.Print({{"file", options.file}, {"bytes", image.size()}});
+        session.Print({{"file", options.file.name}, {"bytes", image.size()}});
     } else {
-        session.Out() << "the image of a fresh instrument written to " << options.file << '\n';
+        session.Out() << "the image of a fresh instrument written to " << file.ShownName() << '\n';
     }
 }
 
 void AddWriteOptions(CommandSpec command, const std::shared_ptr<WriteOptions>& options, BackupHabit habit) {
-    command.Add("FILE", options->file, "image of 8192 bytes").Required();
+    command.Add("--image,FILE", options->file, "image of 8192 bytes; `-` is standard input")
+        .Type("FILE")
+        .Required();
     command.AddFlag("--force", options->force, "write an image that the driver cannot use").Group("Change");
     AddChangeOptions(command, options->change, habit);
     AddInstrumentOptions(command, options->memory.instrument);
@@ -106,7 +110,7 @@ void AddWriteOptions(CommandSpec command, const std::shared_ptr<WriteOptions>& o
 void AddEepromTransfers(CommandSpec group, Session& session) {
     const auto backup = std::make_shared<BackupOptions>();
     CommandSpec command = group.AddCommand("backup", "save the EEPROM of an instrument in a file");
-    command.Add("FILE", backup->file, "is replaced when the backup is complete").Required();
+    AddNewFileOptions(command, "--image,FILE", backup->file);
     AddInstrumentOptions(command, backup->memory.instrument);
     AddJsonFlag(command, backup->memory.json);
     SetAction(command, session, backup, Backup);
@@ -124,7 +128,7 @@ void AddEepromTransfers(CommandSpec group, Session& session) {
 
     const auto fresh = std::make_shared<BackupOptions>();
     command = group.AddCommand("new", "make the image of a fresh instrument");
-    command.Add("FILE", fresh->file, "is replaced when the image is complete").Required();
+    AddNewFileOptions(command, "--image,FILE", fresh->file);
     AddJsonFlag(command, fresh->memory.json);
     SetAction(command, session, fresh, New);
 }

@@ -5,6 +5,7 @@
 
 #include "Commands/CommonOptions.h"
 #include "Commands/Eeprom.h"
+#include "Memory/ByteSource.h"
 #include "Memory/ImageCheck.h"
 #include "Memory/ImageDiff.h"
 #include "Memory/ImageEdit.h"
@@ -27,15 +28,6 @@ struct ViewOptions {
     MemoryOptions memory;
     bool numbers = false;
 };
-
-/// The view commands take the image as their argument.
-void AddViewOptions(CommandSpec command, const std::shared_ptr<ViewOptions>& options) {
-    OptionSpec file =
-        command.Add("FILE", options->memory.imageFile, "image file (default: the EEPROM of an instrument)");
-    AddInstrumentOptions(command, options->memory.instrument);
-    file.Excludes("--device").Excludes("--transport");
-    AddJsonFlag(command, options->memory.json);
-}
 
 Json JsonOfCopy(const LogCopy& copy) {
     return {{"readable", copy.isReadable},
@@ -132,7 +124,7 @@ void Check(Session& session, const ViewOptions& options) {
 
 struct DiffOptions {
     MemoryOptions memory;
-    std::string a, b;
+    std::string a;
 };
 
 std::string TextOfSide(const std::optional<Property>& value, bool isWord) {
@@ -208,12 +200,11 @@ void PrintDiff(Session& session, const ImageDiff& diff, const std::string& a, co
 }
 
 void Diff(Session& session, const DiffOptions& options) {
-    const EepromImage a = ReadImageFile(options.a);
-    MemoryOptions other = options.memory;
-    other.imageFile = options.b;
-    const MemoryTarget b(session, other, MemoryTarget::Use::Read);
+    const EepromImage a = ReadImageFile(session, options.a);
+    const std::string nameOfA = ShownSource(options.a);
+    const MemoryTarget b(session, options.memory, MemoryTarget::Use::Read);
     const ImageDiff diff = Compare(a, b.Image());
-    const std::string unreadable = TextOfUnreadable(diff, options.a, b.Name());
+    const std::string unreadable = TextOfUnreadable(diff, nameOfA, b.Name());
     if (options.memory.json) {
         Json values = Json::array();
         for (const ImageDiff::Value& value : diff.values) {
@@ -230,17 +221,17 @@ void Diff(Session& session, const DiffOptions& options) {
                              {"differentBytes", area.different},
                              {"firstDifference", area.firstDifference}});
         }
-        session.Print({{"a", options.a},
+        session.Print({{"a", nameOfA},
                        {"b", b.Name()},
                        {"same", diff.IsEmpty()},
                        {"unreadable", unreadable.empty() ? Json(nullptr) : Json(unreadable)},
                        {"values", values},
                        {"areas", areas}});
     } else {
-        PrintDiff(session, diff, options.a, b.Name());
+        PrintDiff(session, diff, nameOfA, b.Name());
     }
     if (!diff.IsEmpty()) {
-        throw ToolFailure(ExitCode::Different, options.a + " and " + b.Name() + " differ");
+        throw ToolFailure(ExitCode::Different, nameOfA + " and " + b.Name() + " differ");
     }
 }
 
@@ -250,24 +241,21 @@ void AddEepromViews(CommandSpec group, Session& session) {
     const auto show = std::make_shared<ViewOptions>();
     CommandSpec command = group.AddCommand("show", "show what is in an EEPROM or an image");
     command.AddFlag("--numbers", show->numbers, "show vectors as numbers, not as plots").Group("Output");
-    AddViewOptions(command, show);
+    AddMemoryOptions(command, show->memory, "FILE");
     SetAction(command, session, show, Show);
 
     const auto check = std::make_shared<ViewOptions>();
     command = group.AddCommand(
         "check", "check table, logs, checksums and areas, and tell what the driver would use of them");
-    AddViewOptions(command, check);
+    AddMemoryOptions(command, check->memory, "FILE");
     SetAction(command, session, check, Check);
 
     const auto diff = std::make_shared<DiffOptions>();
     command = group.AddCommand("diff",
                                "compare two images, or an image and an instrument, by value and "
                                "by area; exit code 9 when they differ");
-    command.Add("A", diff->a, "image file").Required();
-    OptionSpec other = command.Add("B", diff->b, "image file (default: the EEPROM of an instrument)");
-    AddInstrumentOptions(command, diff->memory.instrument);
-    other.Excludes("--device").Excludes("--transport");
-    AddJsonFlag(command, diff->memory.json);
+    command.Add("A", diff->a, "image file; `-` is standard input").Required();
+    AddMemoryOptions(command, diff->memory, "B");
     SetAction(command, session, diff, Diff);
 }
 

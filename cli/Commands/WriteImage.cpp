@@ -2,6 +2,7 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
+#include "Memory/ByteSource.h"
 #include "Memory/EepromWrite.h"
 #include "Output/Json.h"
 #include "Protocol/Instrument.h"
@@ -16,7 +17,7 @@ struct Options {
 };
 
 void WriteImage(Session& session, const Options& options) {
-    const EepromImage image = ReadImageFile(options.file);
+    const EepromImage image = ReadImageFile(session, options.file);
     Instrument instrument(session, options.instrument, Instrument::Choice::MustBeNamed);
     std::vector<WritePiece> pieces;
     for (std::uint32_t at = 0; at < Protocol::EepromSize; at += Protocol::EepromWritePiece) {
@@ -28,8 +29,8 @@ void WriteImage(Session& session, const Options& options) {
         session.Print(
             {{"identifier", instrument.Identifier()}, {"file", options.file}, {"pieces", pieces.size()}});
     } else {
-        session.Out() << options.file << " written to " << instrument.Identifier() << " in " << pieces.size()
-                      << " pieces\n";
+        session.Out() << ShownSource(options.file) << " written to " << instrument.Identifier() << " in "
+                      << pieces.size() << " pieces\n";
     }
 }
 
@@ -41,7 +42,9 @@ void AddWriteImage(CommandSpec app, Session& session) {
         app.AddCommand("write-image",
                        "write the whole of an EEPROM image, whatever is in it, as the "
                        "library does, and read it back (`ostra eeprom write` is the safe way)");
-    command.Add("FILE", options->file, "image of 8192 bytes").Required();
+    command.Add("--image,FILE", options->file, "image of 8192 bytes; `-` is standard input")
+        .Type("FILE")
+        .Required();
     AddInstrumentOptions(command, options->instrument);
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, WriteImage);

@@ -1,62 +1,78 @@
 #include "Memory/EepromFile.h"
 
-#include <cerrno>
 #include <filesystem>
-#include <fstream>
-#include <system_error>
 
-#include "Failure.h"
+#include "Memory/ByteSource.h"
 #include "Protocol/Instrument.h"
+#include "Session.h"
 
 namespace Varnholt::Cli {
-
 namespace {
 
+/// Returns when there is something to read.
+void Await(Session& session, ByteSource& source, const std::string& name) {
+    constexpr std::uint32_t lookEvery = 50;  // milliseconds
+    for (std::uint32_t waited = 0; !source.Wait(lookEvery); waited += lookEvery) {
+        session.UserInterruption().ThrowIfRequested();
+        if (waited >= session.InputPatience()) {
+            throw ToolFailure(ExitCode::File, "nothing comes from " + ShownSource(name),
+                              "whatever writes into it must do so while this command runs");
+        }
+    }
+    session.UserInterruption().ThrowIfRequested();
+}
+
 /// At most one byte more than `limit`: that many are too many.
-std::vector<std::uint8_t> ReadFileUpTo(const std::string& name, std::size_t limit) {
-    const auto fail = [&name](const std::string& why) {
-        throw ToolFailure(ExitCode::File, "cannot read " + name + ": " + why);
-    };
+std::vector<std::uint8_t> ReadFileUpTo(Session& session, const std::string& name, std::size_t limit) {
     std::error_code error;
-    const std::filesystem::file_status status = std::filesystem::status(name, error);
-    if (std::filesystem::is_directory(status)) {
-        fail("it is a directory");
+    if (name == StandardStream) {
+        session.ClaimIn();
+    } else if (std::filesystem::is_directory(name, error)) {
+        throw ToolFailure(ExitCode::File, "cannot read " + name + ": it is a directory");
     }
-    // Opening a pipe would wait for somebody who writes into it.
-    if (std::filesystem::exists(status) && !std::filesystem::is_regular_file(status)) {
-        fail("it is no ordinary file");
-    }
-    errno = 0;
-    std::ifstream file(name, std::ios::binary);
-    if (!file) {
-        fail(errno != 0 ? std::generic_category().message(errno) : "it cannot be opened");
+    const std::unique_ptr<ByteSource> source = OpenByteSource(name);
+    if (source->IsTerminal()) {
+        throw ToolFailure(ExitCode::Usage, ShownSource(name) + " is a terminal: nobody types raw bytes",
+                          "name a file, or let a pipe bring it");
     }
     std::vector<std::uint8_t> content(limit + 1);
-    file.read(reinterpret_cast<char*>(content.data()), static_cast<std::streamsize>(content.size()));
-    if (file.bad()) {
-        fail("the reading failed");
+    for (std::size_t size = 0; size < content.size();) {
+        Await(session, *source, name);
+        const std::size_t count = source->Read(content.data() + size, content.size() - size);
+        size += count;
+        if (count == 0) {
+            content.resize(size);
+        }
     }
-    content.resize(static_cast<std::size_t>(file.gcount()));
     return content;
 }
 
 }  // namespace
 
-std::vector<std::uint8_t> ReadFileOfSize(const std::string& name, std::size_t size, const std::string& what,
-                                         const std::string& advice) {
-    std::vector<std::uint8_t> content = ReadFileUpTo(name, size);
+std::string ShownSource(const std::string& name) {
+    return name == StandardStream ? "standard input" : name;
+}
+
+std::string QuotedSource(const std::string& name) {
+    return name == StandardStream ? name : QuotedFileName(name);
+}
+
+std::vector<std::uint8_t> ReadFileOfSize(Session& session, const std::string& name, std::size_t size,
+                                         const std::string& what, const std::string& advice) {
+    std::vector<std::uint8_t> content = ReadFileUpTo(session, name, size);
     if (content.size() != size) {
         const std::string found =
             content.size() > size ? "more than " + std::to_string(size) + " bytes"
                                   : std::to_string(content.size()) + " bytes, not " + std::to_string(size);
-        throw ToolFailure(ExitCode::BadData, name + " is not " + what + ": it has " + found, advice);
+        throw ToolFailure(ExitCode::BadData, ShownSource(name) + " is not " + what + ": it has " + found,
+                          advice);
     }
     return content;
 }
 
-EepromImage ReadImageFile(const std::string& name) {
+EepromImage ReadImageFile(Session& session, const std::string& name) {
     return ReadFileOfSize(
-        name, Protocol::EepromSize, "an EEPROM image",
+        session, name, Protocol::EepromSize, "an EEPROM image",
         "`ostra eeprom backup FILE` makes one from an instrument, `ostra eeprom new FILE` a fresh one");
 }
 

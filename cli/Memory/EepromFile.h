@@ -9,13 +9,15 @@ namespace Varnholt::Cli {
 /// The content of an EEPROM, 8192 bytes.
 using EepromImage = std::vector<std::uint8_t>;
 
-/// The file's content when it has exactly `size` bytes; `what` a file of that size is, with its article, is
-/// for the message. Throws `ToolFailure`: `ExitCode::File` when it cannot be read, `ExitCode::BadData` when
-/// it has another size.
-std::vector<std::uint8_t> ReadFileOfSize(const std::string& name, std::size_t size, const std::string& what,
-                                         const std::string& advice = {});
+class Session;
+
+/// The content of a file, a pipe or, for "-", of standard input when it has exactly `size` bytes; `what` a
+/// file of that size is, with its article, is for the message. Throws `ToolFailure`: `ExitCode::File` when it
+/// cannot be read or brings nothing for long, `ExitCode::BadData` when it has another size.
+std::vector<std::uint8_t> ReadFileOfSize(Session& session, const std::string& name, std::size_t size,
+                                         const std::string& what, const std::string& advice = {});
 
 /// An image, as far as its size tells.
-EepromImage ReadImageFile(const std::string& name);
+EepromImage ReadImageFile(Session& session, const std::string& name);
 
 }  // namespace Varnholt::Cli

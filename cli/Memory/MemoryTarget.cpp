@@ -6,6 +6,7 @@
 #include <ostream>
 
 #include "Commands/CommonOptions.h"
+#include "Memory/ByteSource.h"
 #include "Memory/ImageCheck.h"
 #include "Output/AtomicFile.h"
 #include "Output/Json.h"
@@ -14,6 +15,16 @@
 
 namespace Varnholt::Cli {
 namespace {
+
+/// What is read once and then written could be two different things.
+void RefuseToChangeInPlace(const std::string& file) {
+    std::error_code error;
+    if (file != StandardStream && std::filesystem::is_other(file, error)) {
+        throw ToolFailure(
+            ExitCode::Usage, file + " is no ordinary file and cannot be changed",
+            "`--image -` reads standard input and writes what becomes of it to standard output");
+    }
+}
 
 /// A name that tells instrument and time, and that no file has yet.
 std::string NewBackupName(const std::string& identifier) {
@@ -49,9 +60,12 @@ std::uint32_t CountDifferences(const EepromImage& a, const EepromImage& b) {
 
 }  // namespace
 
-void AddMemoryOptions(CommandSpec command, MemoryOptions& options) {
+void AddMemoryOptions(CommandSpec command, MemoryOptions& options, const std::string& argument) {
     AddInstrumentOptions(command, options.instrument);
-    command.Add("--image", options.imageFile, "work on this image file instead of an instrument")
+    const std::string names = argument.empty() ? "--image" : "--image," + argument;
+    command
+        .Add(names.c_str(), options.imageFile,
+             "work on this image file instead of an instrument; `-` is standard input (and output)")
         .Type("FILE")
         .Excludes("--device")
         .Excludes("--transport")
@@ -77,8 +91,11 @@ void AddChangeOptions(CommandSpec command, ChangeOptions& options, BackupHabit h
 MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, Use use)
     : session(usedSession), file(options.imageFile) {
     if (!file.empty()) {
-        name = file;
-        image = ReadImageFile(file);
+        if (use == Use::Change) {
+            RefuseToChangeInPlace(file);
+        }
+        name = ShownSource(file);
+        image = ReadImageFile(session, file);
         return;
     }
     instrument.emplace(
@@ -89,7 +106,7 @@ MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, U
 }
 
 ToolFailure MemoryTarget::Unusable(const std::string& reason) const {
-    const std::string which = instrument ? "--device " + ShortNameOf(name) : QuotedFileName(file);
+    const std::string which = instrument ? "--device " + ShortNameOf(name) : QuotedSource(file);
     return {ExitCode::BadData, name + ": the driver cannot use what is in it: " + reason,
             "`ostra eeprom check " + which + "` tells what is wrong with it"};
 }
@@ -98,8 +115,27 @@ std::string MemoryTarget::MakeBackup(const ChangeOptions& options) const {
     if (options.noBackup) {
         return {};
     }
-    const std::string backup = options.backupFile.empty() ? NewBackupName(name) : options.backupFile;
-    WriteFileAtomically(backup, image, AtomicFile::IfItExists::Refuse);
+    if (options.backupFile == StandardStream) {
+        session.ClaimOut();
+        session.WriteClaimedOut(image);
+        session.Note("backup of " + name + " written to standard output");
+        return options.backupFile;
+    }
+    std::string backup = options.backupFile;
+    if (!backup.empty()) {
+        WriteFileAtomically(backup, image, AtomicFile::IfItExists::Refuse);
+    } else {
+        backup = NewBackupName(name);
+        try {
+            WriteFileAtomically(backup, image, AtomicFile::IfItExists::Refuse);
+        } catch (const ToolFailure& failure) {
+            throw ToolFailure(
+                failure.Code(),
+                std::string("no backup can be made in the current folder, and nothing was changed: ") +
+                    failure.what(),
+                "--backup FILE makes it elsewhere; --no-backup leaves it out");
+        }
+    }
     session.Note("backup of " + name + " written to " + backup);
     return backup;
 }
@@ -108,8 +144,10 @@ std::string MemoryTarget::WayBack(const std::string& backup) const {
     if (backup.empty()) {
         return "the same command once more writes what is missing; there is no backup";
     }
-    return fmt::format("this brings back what was there before: ostra eeprom restore {} --device {}{}",
-                       QuotedFileName(backup), ShortNameOf(name),
+    const bool isPiped = backup == StandardStream;
+    return fmt::format("this brings back what was there before{}: ostra eeprom restore {} --device {}{}",
+                       isPiped ? " (FILE: what went to standard output)" : "",
+                       isPiped ? "FILE" : QuotedFileName(backup), ShortNameOf(name),
                        IsSane(CheckImage(image)) ? "" : " --force");
 }
 
@@ -123,6 +161,9 @@ MemoryTarget::Outcome MemoryTarget::Change(const EepromImage& wanted, const Chan
             outcome.backup = MakeBackup(options);
             WriteEeprom(session, *instrument, wanted, pieces, WayBack(outcome.backup));
         }
+    } else if (!options.dryRun && file == StandardStream) {
+        session.ClaimOut();
+        session.WriteClaimedOut(wanted);  // with or without a change: the next one waits for it
     } else if (!options.dryRun && outcome.bytes > 0) {
         WriteFileAtomically(file, wanted);
     }

@@ -24,8 +24,9 @@ struct ChangeOptions {
     std::string backupFile;  ///< empty: a name is made up
 };
 
-/// --image FILE beside --device, --transport and --json.
-void AddMemoryOptions(CommandSpec command, MemoryOptions& options);
+/// --image FILE beside --device, --transport and --json. The file may stand as an argument too where that has
+/// a name.
+void AddMemoryOptions(CommandSpec command, MemoryOptions& options, const std::string& argument = {});
 enum class BackupHabit {
     Always,     ///< unless --no-backup says otherwise
     WhenNamed,  ///< with --backup only

@@ -1,4 +1,10 @@
+#if !defined(_WIN32)
+#include <sys/stat.h>
+#include <unistd.h>
+#endif
+
 #include <numeric>
+#include <thread>
 
 #include "Memory/ImageEdit.h"
 #include "Memory/ImageModel.h"
@@ -58,7 +64,7 @@ TEST_P(MemoryCommandsTest, ReadingChangesNothing) {
              Case{{"eeprom", "diff", image}, {}},
              Case{{"eeprom", "show"}, {}},
              Case{{"eeprom", "show", "--json"}, {image}},
-             Case{{"eeprom", "check", "--json"}, {image}},
+             Case{{"eeprom", "check", "--json"}, {"--image", image}},
              Case{{"calibration", "show", "--json"}, {"--image", image}},
              Case{{"log", "show", "--json"}, {"--image", image}},
              Case{{"ram", "show"}, {}},
@@ -186,10 +192,168 @@ TEST_P(MemoryCommandsTest, OnlySaneImagesAreWritten) {
     EXPECT_EQ(tool.Run({"eeprom", "write", image, "--force"}), ExitCode::BadData)
         << "no force makes it an image";
     Fail({"eeprom", "write", folder.Path("missing")}, ExitCode::File);
-#if !defined(_WIN32)
-    Fail({"eeprom", "write", "/dev/null"}, ExitCode::File, "it is no ordinary file");
-#endif
 }
+
+TEST_P(MemoryCommandsTest, FilesThatAreMadeReplaceOthersByForceOnly) {
+    struct Case {
+        Arguments command;
+        EepromImage content;
+    };
+    for (const Case& row : {
+             Case{{"eeprom", "backup"}, before},
+             Case{{"eeprom", "new"}, Cli::FreshImage()},
+             Case{{"binary", "get"}, Cli::BinaryBlockOf(before)},
+         }) {
+        const auto with = [&row](const Arguments& more) {
+            Arguments arguments = row.command;
+            arguments.insert(arguments.end(), more.begin(), more.end());
+            return arguments;
+        };
+        WriteFile(image, {1});
+        Fail(with({image}), ExitCode::File, "--force replaces it");
+        EXPECT_EQ(ReadFile(image), std::vector<std::uint8_t>{1});
+        Succeed(with({image, "--force"}));
+        EXPECT_EQ(ReadFile(image), row.content);
+        for (const char* form : {"--json", "--force"}) {
+            Succeed(with({"-", form}));
+            EXPECT_EQ(tool.Out(), std::string(row.content.begin(), row.content.end())) << "and nothing else";
+            EXPECT_NE(tool.Err(), "");
+        }
+        tool.outFacts.isTerminal = true;
+        Fail(with({"-"}), ExitCode::Usage, "terminal");
+        EXPECT_EQ(tool.Out(), "");
+        tool.outFacts.isTerminal = false;
+    }
+}
+
+#if !defined(_WIN32)
+/// Standard input is a pipe that holds these bytes and ends.
+class PipedInput final {
+  public:
+    explicit PipedInput(const std::vector<std::uint8_t>& content) {
+        int ends[2];
+        EXPECT_EQ(::pipe(ends), 0);
+        EXPECT_EQ(::write(ends[1], content.data(), content.size()), static_cast<ssize_t>(content.size()));
+        ::close(ends[1]);
+        ::dup2(ends[0], STDIN_FILENO);
+        ::close(ends[0]);
+    }
+    ~PipedInput() {
+        ::dup2(before, STDIN_FILENO);
+        ::close(before);
+    }
+    PipedInput(const PipedInput&) = delete;
+    PipedInput& operator=(const PipedInput&) = delete;
+
+  private:
+    const int before = ::dup(STDIN_FILENO);
+};
+
+TEST_P(MemoryCommandsTest, ImagesComeFromStandardInputAndGoToStandardOutput) {
+    const EepromImage wanted = Calibrated("5");
+    WriteFile(image, wanted);
+    const auto bytes = [](const EepromImage& content) { return std::string(content.begin(), content.end()); };
+    struct Case {
+        Arguments arguments;
+        EepromImage input;
+        ExitCode code;
+        std::string out;   ///< empty: whatever it is, it is no image
+        const char* text;  ///< on standard error
+    };
+    for (const Case& row : {
+             Case{{"calibration", "set", "1211=5", "--image", "-"},
+                  Calibrated("77"),
+                  ExitCode::Success,
+                  bytes(wanted),
+                  "byte of standard input changed"},
+             Case{{"calibration", "set", "1211=5", "--image", "-"},
+                  wanted,
+                  ExitCode::Success,
+                  bytes(wanted),
+                  ""},
+             Case{{"log", "reset", "--image", "-", "--dry-run"}, wanted, ExitCode::Success, "", ""},
+             Case{{"eeprom", "check", "/dev/stdin"}, wanted, ExitCode::Success, "", ""},
+             Case{{"eeprom", "show", "-", "--json"}, wanted, ExitCode::Success, "", ""},
+             Case{{"eeprom", "check", "-"},
+                  EepromImage(8192),
+                  ExitCode::BadData,
+                  "",
+                  "standard input has errors"},
+             Case{{"eeprom", "diff", image, "-"}, wanted, ExitCode::Success, "", ""},
+             Case{{"eeprom", "diff", "-", "-"}, wanted, ExitCode::Usage, "", "standard input"},
+             Case{{"calibration", "set", "1211=5", "--image", "/dev/stdin"},
+                  wanted,
+                  ExitCode::Usage,
+                  "",
+                  "--image -"},
+             Case{{"eeprom", "write", "-", "--backup", "-"},
+                  wanted,
+                  ExitCode::Success,
+                  bytes(before),
+                  "written to standard output"},
+             Case{{"write-image", "-"}, before, ExitCode::Success, "", ""},
+             Case{{"eeprom", "restore", "-"}, EepromImage(8191), ExitCode::BadData, "", "it has 8191 bytes"},
+             Case{{"eeprom", "restore", "-"},
+                  EepromImage(8193),
+                  ExitCode::BadData,
+                  "",
+                  "more than 8192 bytes"},
+             Case{{"binary", "put", "-"}, {}, ExitCode::BadData, "", "it has 0 bytes"},
+         }) {
+        const PipedInput input(row.input);
+        SCOPED_TRACE(testing::PrintToString(row.arguments));
+        Fail(row.arguments, row.code, row.text);
+        if (row.out.empty()) {
+            EXPECT_NE(tool.Out().size(), 8192u);
+        } else {
+            EXPECT_EQ(tool.Out(), row.out);
+        }
+    }
+    ExpectUnchanged();
+}
+
+TEST_P(MemoryCommandsTest, PipesAreNotWaitedForWithoutEnd) {
+    const std::string pipe = folder.Path("pipe");
+    ASSERT_EQ(::mkfifo(pipe.c_str(), 0600), 0);
+    tool.inputPatience = 1;
+    Fail({"eeprom", "check", pipe}, ExitCode::File, "nothing comes from " + pipe);
+    tool.inputPatience = std::numeric_limits<std::uint32_t>::max();
+    Cli::Interruption interruption;
+    tool.interruption = &interruption;
+    const auto write = [&](const std::function<void(std::ofstream & file)>& action) {
+        return std::thread([&pipe, action] {
+            std::ofstream file(pipe, std::ios::binary);  // opened when the tool reads
+            action(file);
+        });
+    };
+    std::thread writer = write([this](std::ofstream& file) {
+        // In two pieces.
+        file.write(reinterpret_cast<const char*>(before.data()), 5000).flush();
+        file.write(reinterpret_cast<const char*>(before.data()) + 5000, 3192);
+    });
+    Succeed({"eeprom", "diff", pipe, "--device", "sim"});
+    writer.join();
+    writer = write([&interruption](std::ofstream&) { interruption.Request(); });
+    Fail({"eeprom", "write", pipe}, ExitCode::Interrupted);
+    writer.join();
+    ExpectUnchanged();
+}
+
+TEST_P(MemoryCommandsTest, AFolderThatTakesNoBackupIsSaidToBe) {
+    const auto previous = std::filesystem::current_path();
+    std::filesystem::create_directory(folder.Path("gone"));
+    std::filesystem::current_path(folder.Path("gone"));
+    std::filesystem::remove(folder.Path("gone"));
+    for (const Arguments& command :
+         std::vector<Arguments>{{"calibration", "set", "1211=5"}, {"word", "put", "10200=9"}}) {
+        Fail(command, ExitCode::File, "current folder, and nothing was changed");
+        EXPECT_THAT(tool.Err(), HasSubstr("--backup FILE"));
+    }
+    ExpectUnchanged();
+    Succeed({"calibration", "set", "1211=5", "--backup", backup});
+    std::filesystem::current_path(previous);
+}
+#endif
 
 /// Wherever a write fails, the tool says how to undo it, and that works.
 TEST_P(MemoryCommandsTest, AFailedWriteTellsTheWayBack) {

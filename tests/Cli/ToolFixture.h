@@ -24,7 +24,7 @@ class ToolRunner {
     Cli::ExitCode Run(const Arguments& arguments) {
         out.str({});
         err.str({});
-        Cli::Surroundings surroundings{out, err, outFacts, errFacts};
+        Cli::Surroundings surroundings{out, err, outFacts, errFacts, inputPatience};
         Cli::Interruption none;
         return Cli::RunTool(arguments, surroundings, interruption != nullptr ? *interruption : none);
     }
@@ -43,6 +43,7 @@ class ToolRunner {
     }
 
     Cli::StreamFacts outFacts, errFacts;
+    std::uint32_t inputPatience = 30'000;
     Cli::Interruption* interruption = nullptr;
 
   private:

@@ -1,0 +1,64 @@
+#include <fcntl.h>
+#include <poll.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <system_error>
+
+#include "Failure.h"
+#include "Memory/ByteSource.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+class Descriptor final : public ByteSource {
+  public:
+    Descriptor(int openDescriptor, std::string name)
+        : descriptor(openDescriptor), shownName(std::move(name)) {
+        if (descriptor < 0) {
+            Fail();
+        }
+    }
+    ~Descriptor() override { ::close(descriptor); }
+    Descriptor(const Descriptor&) = delete;
+    Descriptor& operator=(const Descriptor&) = delete;
+
+    bool IsTerminal() const override { return ::isatty(descriptor) != 0; }
+
+    bool Wait(std::uint32_t milliseconds) override {
+        pollfd watched{descriptor, POLLIN, 0};
+        const int found = ::poll(&watched, 1, static_cast<int>(milliseconds));
+        if (found < 0 && errno != EINTR) {
+            Fail();
+        }
+        return found > 0;
+    }
+
+    std::size_t Read(std::uint8_t* buffer, std::size_t size) override {
+        const ssize_t count = ::read(descriptor, buffer, size);
+        if (count < 0) {
+            Fail();
+        }
+        return static_cast<std::size_t>(count);
+    }
+
+  private:
+    [[noreturn]] void Fail() const {
+        throw ToolFailure(ExitCode::File,
+                          "cannot read " + shownName + ": " + std::generic_category().message(errno));
+    }
+
+    const int descriptor;
+    const std::string shownName;
+};
+
+}  // namespace
+
+std::unique_ptr<ByteSource> OpenByteSource(const std::string& name) {
+    const int descriptor = name == StandardStream
+                               ? ::fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, 0)
+                               : ::open(name.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC);
+    return std::make_unique<Descriptor>(descriptor, ShownSource(name));
+}
+
+}  // namespace Varnholt::Cli

@@ -1,0 +1,82 @@
+#include <windows.h>
+
+#include <algorithm>
+#include <system_error>
+
+#include "Failure.h"
+#include "Memory/ByteSource.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+class File final : public ByteSource {
+  public:
+    File(HANDLE openFile, bool isOwn, std::string name)
+        : file(openFile), owned(isOwn), shownName(std::move(name)) {
+        if (file == INVALID_HANDLE_VALUE || file == nullptr) {
+            Fail();
+        }
+    }
+    ~File() override {
+        if (owned) {
+            ::CloseHandle(file);
+        }
+    }
+    File(const File&) = delete;
+    File& operator=(const File&) = delete;
+
+    bool IsTerminal() const override {
+        DWORD mode = 0;
+        return ::GetConsoleMode(file, &mode) != 0;
+    }
+
+    bool Wait(std::uint32_t milliseconds) override {
+        // A pipe cannot be waited for: it is looked at from time to time.
+        constexpr std::uint32_t lookEvery = 10;
+        for (std::uint32_t waited = 0; ::GetFileType(file) == FILE_TYPE_PIPE; waited += lookEvery) {
+            DWORD available = 0;
+            if (::PeekNamedPipe(file, nullptr, 0, nullptr, &available, nullptr) == 0 || available > 0) {
+                break;
+            }
+            if (waited >= milliseconds) {
+                return false;
+            }
+            ::Sleep(std::min(lookEvery, milliseconds - waited));
+        }
+        return true;
+    }
+
+    std::size_t Read(std::uint8_t* buffer, std::size_t size) override {
+        DWORD count = 0;
+        // The end of a pipe is an error of its own.
+        if (::ReadFile(file, buffer, static_cast<DWORD>(size), &count, nullptr) == 0 &&
+            ::GetLastError() != ERROR_BROKEN_PIPE) {
+            Fail();
+        }
+        return count;
+    }
+
+  private:
+    [[noreturn]] void Fail() const {
+        const auto code = static_cast<int>(::GetLastError());
+        throw ToolFailure(ExitCode::File,
+                          "cannot read " + shownName + ": " + std::system_category().message(code));
+    }
+
+    const HANDLE file;
+    const bool owned;
+    const std::string shownName;
+};
+
+}  // namespace
+
+std::unique_ptr<ByteSource> OpenByteSource(const std::string& name) {
+    const bool isStandard = name == StandardStream;
+    const HANDLE file = isStandard
+                            ? ::GetStdHandle(STD_INPUT_HANDLE)
+                            : ::CreateFileA(name.c_str(), GENERIC_READ, FILE_SHARE_READ | FILE_SHARE_WRITE,
+                                            nullptr, OPEN_EXISTING, 0, nullptr);
+    return std::make_unique<File>(file, !isStandard, ShownSource(name));
+}
+
+}  // namespace Varnholt::Cli
