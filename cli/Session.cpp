@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <ostream>
+#include <utility>
 
 #include "Instrument.h"
 #include "Output/Json.h"
@@ -31,7 +32,13 @@ void Session::CarryOut() {
     if (!captureFile.empty()) {
         recording = RecordTraffic(captureFile);
     }
-    files.emplace(Platform::DeviceFiles());
+    if (verbose) {
+        loggedFiles.emplace(Platform::DeviceFiles(),
+                            [this](const std::string& line) { where.log << Name + line + '\n'; });
+        files.emplace(*loggedFiles);
+    } else {
+        files.emplace(Platform::DeviceFiles());
+    }
     filesInForce.emplace(*files);
     interruption.SetAction([this] { files->Interrupt(); });
     interruption.ThrowIfRequested();  // one that came before
@@ -43,7 +50,7 @@ void Session::CarryOut() {
 }
 
 void Session::BeginRecording() {
-    if (recording) {
+    if (recording && !std::exchange(recordingHasBegun, true)) {
         recording->Begin();
     }
 }
@@ -103,7 +110,9 @@ void Session::Report(const FailureReport& report) {
 }
 
 Progress Session::MakeProgress(const std::string& title, std::uint64_t total, const std::string& unit) {
-    return {where.err, where.errFacts, title, total, unit};
+    StreamFacts facts = where.errFacts;
+    facts.isTerminal = facts.isTerminal && !verbose;
+    return {where.err, facts, title, total, unit};
 }
 
 PlotStyle Session::StyleOfPlots() const {

@@ -10,6 +10,7 @@
 
 #include "Failure.h"
 #include "Interruption.h"
+#include "LoggedDeviceFiles.h"
 #include "Output/Plot.h"
 #include "Output/Progress.h"
 #include "Platform/InterruptibleDeviceFiles.h"
@@ -17,10 +18,12 @@
 
 namespace Varnholt::Cli {
 
-/// Where a run of the tool reads and writes. Results go to `out`, everything else to `err`.
+/// Where a run of the tool reads and writes. Results go to `out`, everything else to `err`; but the lines of
+/// --verbose go to `log`, since they come from any thread, one at a time.
 struct Surroundings {
     std::ostream& out;
     std::ostream& err;
+    std::ostream& log;
     StreamFacts outFacts;
     StreamFacts errFacts;
     /// How long a pipe that is read may bring nothing.
@@ -78,6 +81,7 @@ class Session final {
     /// What the command line asks for.
     std::function<void()> action;
     std::string captureFile;  ///< for the USB traffic; empty: it is not recorded
+    bool verbose = false;     ///< commands and transfers are told on standard error
     /// Does it, when the command line has been understood as a whole.
     void CarryOut();
 
@@ -87,7 +91,9 @@ class Session final {
     Surroundings& where;
     Interruption& interruption;
     std::unique_ptr<TrafficRecording> recording;
-    std::optional<Platform::InterruptibleDeviceFiles> files;  // stand on those of the recording
+    bool recordingHasBegun = false;
+    std::optional<LoggedDeviceFiles> loggedFiles;             // stand on those of the recording
+    std::optional<Platform::InterruptibleDeviceFiles> files;  // stand on those before
     std::optional<Platform::ScopedDeviceFiles> filesInForce;
     const std::optional<bool> transportBefore;
     std::string instrumentInUse;

@@ -2,9 +2,10 @@
 
 #include <algorithm>
 #include <CLI/CLI.hpp>
-#include <ostream>
+#include <sstream>
 
 #include "Commands/Commands.h"
+#include "Commands/CommonOptions.h"
 #include "SystemCommands.h"
 
 namespace Varnholt::Cli {
@@ -29,7 +30,90 @@ Exit codes:
   130  interrupted (Ctrl-C)
 )";
 
-void BuildCommandLine(CLI::App& app, Session& session) {
+/// An argument that is an option as well is described once.
+class HelpFormatter final : public CLI::Formatter {
+    std::string make_option(const CLI::Option* option, bool isPositional) const override {
+        if (!isPositional || option->get_lnames().empty()) {
+            return Formatter::make_option(option, isPositional);
+        }
+        std::ostringstream out;
+        CLI::detail::format_help(out, make_option_name(option, true), "the same as " + option->get_name(),
+                                 column_width_);
+        return out.str();
+    }
+};
+
+/// A command, and its name as the user writes it.
+struct NamedCommand {
+    CLI::App* command;
+    std::string name;
+};
+
+NamedCommand ChosenCommand(CLI::App& app) {
+    NamedCommand chosen{&app, app.get_name()};
+    for (auto next = app.get_subcommands(); !next.empty(); next = chosen.command->get_subcommands()) {
+        chosen.command = next.front();
+        chosen.name += " " + chosen.command->get_name();
+    }
+    return chosen;
+}
+
+std::string AdviceOn(const NamedCommand& command) {
+    return "`" + command.name + " --help` tells more";
+}
+
+void PrintHelp(CLI::App& app, const std::vector<std::string>& words, Session& session) {
+    NamedCommand found{&app, app.get_name()};
+    for (const std::string& word : words) {
+        const auto fitting = found.command->get_subcommands(
+            [&word](CLI::App* command) { return command->get_name() == word; });
+        if (fitting.empty()) {
+            throw ToolFailure(ExitCode::Usage, "`" + found.name + "` has no command '" + word + "'",
+                              AdviceOn(found));
+        }
+        found = {fitting.front(), found.name + " " + word};
+    }
+    session.Out() << app.get_formatter()->make_help(found.command, found.name, CLI::AppFormatMode::Normal);
+}
+
+void AddHelp(CLI::App& app, Session& session) {
+    const auto words = std::make_shared<std::vector<std::string>>();
+    CommandSpec command = CommandSpec(&app).AddCommand("help", "print the help of a command");
+    command.Add("COMMAND", *words, "its name, and for a command of a group the group's before it");
+    command.WhenChosen([&app, &session, words] {
+        session.action = [&app, &session, words] { PrintHelp(app, *words, session); };
+    });
+}
+
+/// An option of the instrument that stands before the command counts as if it stood behind it.
+void PassOn(CLI::App& app, const char* name) {
+    const CLI::Option* const before = app.get_option(name);
+    if (before->count() == 0) {
+        return;
+    }
+    const NamedCommand chosen = ChosenCommand(app);
+    CLI::Option* const own = chosen.command->get_option_no_throw(name);
+    const auto refusal = [&](const std::string& why) {
+        return ToolFailure(ExitCode::Usage, name + why, AdviceOn(chosen));
+    };
+    if (own == nullptr) {
+        throw refusal(" means nothing to `" + chosen.name + "`");
+    }
+    if (own->count() > 0 && own->results() != before->results()) {
+        throw refusal(" is given twice: " + before->results().front() + " and " + own->results().front());
+    }
+    for (const CLI::Option* const other : own->get_excludes()) {
+        if (other->count() > 0) {
+            throw refusal(" excludes " + other->get_name());
+        }
+    }
+    own->clear();
+    own->add_result(before->results().front());
+    own->run_callback();
+}
+
+void BuildCommandLine(CLI::App& app, InstrumentOptions& instrument, Session& session) {
+    app.formatter(std::make_shared<HelpFormatter>());
     app.require_subcommand(1);
     app.fallthrough();  // what stands before the command may stand behind it as well
     app.set_version_flag("--version", "ostra " OSTRA_VERSION, "print the version");
@@ -38,21 +122,20 @@ void BuildCommandLine(CLI::App& app, Session& session) {
     tool.Add("--capture", session.captureFile,
              "record the USB traffic in a pcapng file, made when an instrument is opened")
         .Type("FILE");
+    tool.AddFlag("-v,--verbose", session.verbose,
+                 "tell on standard error what is sent to the instrument and comes from it");
+    AddInstrumentOptions(tool, instrument);
     for (const AddCommand add : Commands) {
         add(tool, session);
     }
     AddSystemCommands(tool, session);
+    AddHelp(app, session);
     app.footer(Footer);  // after the commands, which would inherit it
 }
 
 /// What is wrong with a command line, and whose help tells more.
-FailureReport ReportOf(const CLI::App& app, const CLI::ParseError& error) {
-    const CLI::App* command = &app;
-    std::string name = app.get_name();
-    for (auto chosen = command->get_subcommands(); !chosen.empty(); chosen = command->get_subcommands()) {
-        command = chosen.front();
-        name += " " + command->get_name();
-    }
+FailureReport ReportOf(CLI::App& app, const CLI::ParseError& error) {
+    const NamedCommand chosen = ChosenCommand(app);
     std::string message = error.what();
     if (error.get_exit_code() == static_cast<int>(CLI::ExitCodes::ExtrasError)) {
         message = "not expected here:";  // the parser's own text has them backwards
@@ -60,21 +143,22 @@ FailureReport ReportOf(const CLI::App& app, const CLI::ParseError& error) {
             message += " " + extra;
         }
     }
-    if (!command->get_subcommands({}).empty()) {
+    if (!chosen.command->get_subcommands({}).empty()) {
         // The parser only misses a command where there is one that it does not know, and leaves that to the
         // tool itself.
         const std::vector<std::string> unknown = app.remaining();
         const auto word =
             std::ranges::find_if(unknown, [](const std::string& text) { return !text.starts_with('-'); });
-        message = word == unknown.end() ? "a command is missing behind `" + name + "`"
-                                        : "`" + name + "` has no command '" + *word + "'";
+        message = word == unknown.end() ? "a command is missing behind `" + chosen.name + "`"
+                                        : "`" + chosen.name + "` has no command '" + *word + "'";
     }
-    return {ExitCode::Usage, message, "`" + name + " --help` tells more"};
+    return {ExitCode::Usage, message, AdviceOn(chosen)};
 }
 
 ExitCode Run(std::vector<std::string> arguments, Surroundings& surroundings, Session& session) {
     CLI::App app(Description, "ostra");
-    BuildCommandLine(app, session);
+    InstrumentOptions instrument;
+    BuildCommandLine(app, instrument, session);
     if (arguments.empty()) {
         surroundings.err << app.help();
         return ExitCode::Usage;
@@ -82,6 +166,8 @@ ExitCode Run(std::vector<std::string> arguments, Surroundings& surroundings, Ses
     try {
         std::reverse(arguments.begin(), arguments.end());  // the parser wants the last one first
         app.parse(arguments);
+        PassOn(app, "--device");
+        PassOn(app, "--transport");
     } catch (const CLI::ParseError& error) {
         const bool isHelp = error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success);
         if (isHelp) {

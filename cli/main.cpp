@@ -19,7 +19,10 @@ int main(int argc, char** argv) {
                              DescriptorStream::Lost::IsIgnored);
         err << std::unitbuf;
         err.tie(&out);
-        Surroundings surroundings{out, err, FactsOfStandardOutput(), FactsOfStandardError()};
+        DescriptorStream log(OutputDescriptor::StandardError(), interruption,
+                             DescriptorStream::Lost::IsIgnored);
+        log << std::unitbuf;
+        Surroundings surroundings{out, err, log, FactsOfStandardOutput(), FactsOfStandardError()};
         return static_cast<int>(RunTool({argv + 1, argv + argc}, surroundings, interruption));
     } catch (const std::exception& exception) {
         std::cerr << "ostra: " << exception.what() << '\n';

@@ -80,6 +80,7 @@ std::string RefuseNegative(const std::string& text) {
 
 void DefineOptions(CLI::App& program, ProgramOptions& options) {
     program.footer(Footer + FaultHelp());
+    program.set_version_flag("--version", "ostra-simulator " OSTRA_VERSION, "print the version");
     program.add_option("--name", options.names, "the instrument's name; repeated: one instrument for each")
         ->type_name("NAME");
     program

@@ -336,6 +336,51 @@ TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
     Succeed({"identify", "--json"});
     EXPECT_EQ(tool.Json()["name"], "left");
     EXPECT_THAT(tool.Err(), HasSubstr("taking " + Identifier("left")));
+    for (const Arguments& arguments : std::vector<Arguments>{
+             {"-d", "right", "identify", "--json"},
+             {"--device=right", "--transport", Name(GetParam()), "identify", "--json"},
+             {"-d", "right", "identify", "--json", "-d", "right"},
+             {"ram", "-d", "right", "show", "--json"},
+         }) {
+        Succeed(arguments);
+        EXPECT_EQ(tool.Json()["identifier"], Identifier("right"));
+    }
+    const std::pair<Arguments, const char*> refused[] = {
+        {{"-d", "left", "identify", "-d", "right"}, "--device is given twice: left and right"},
+        {{"-d", "left", "list"}, "--device means nothing to `ostra list`"},
+        {{"list", "-d", "left"}, "--device means nothing to `ostra list`"},
+        {{"-d", "left", "eeprom", "check", "image"}, "--device excludes --image"},
+        {{"--transport", "serial", "list"}, "serial"},
+    };
+    for (const auto& [arguments, text] : refused) {
+        Fail(arguments, ExitCode::Usage, text);
+    }
+}
+
+TEST_P(InstrumentCommandsTest, VerboseTellsWhatIsSent) {
+    host.Add("sim");
+    const auto told = [this] {
+        std::vector<std::string> lines;
+        std::istringstream stream(tool.Log());
+        for (std::string line; std::getline(stream, line);) {
+            if (!line.starts_with("ostra: interrupt ")) {  // is waiting for the button meanwhile
+                lines.push_back(line);
+            }
+        }
+        return lines;
+    };
+    Succeed({"readout", "--verbose"});
+    std::vector<std::string> expected{"ostra: Reset code=31",
+                                      "ostra: SetMeasureParameters p1=294 p2=0 p3=1 p4=6", "ostra: Measure",
+                                      "ostra: bulk in 256 of 256"};
+    if (GetParam() == Transport::Native) {
+        expected.emplace_back("ostra: ButtonReport");  // of the closing
+    }
+    EXPECT_EQ(told(), expected);
+    SetFaults("bulk-in 0:stall");
+    Fail({"-v", "readout"}, ExitCode::InputOutput);
+    EXPECT_THAT(told(),
+                testing::Contains(testing::StartsWith("ostra: bulk in 0 of 256: failed with code 0x")));
 }
 
 TEST_P(InstrumentCommandsTest, FailuresHaveTheirExitCodesAndNameTheInstrument) {
@@ -414,6 +459,19 @@ TEST(CommandLineTest, UsageErrorsGoToStandardError) {
     }
     EXPECT_EQ(tool.Run({"--help"}), ExitCode::Success);
     EXPECT_THAT(tool.Out(), HasSubstr("Exit codes:"));
+    for (const Arguments& command :
+         std::vector<Arguments>{{}, {"readout"}, {"eeprom"}, {"eeprom", "check"}}) {
+        Arguments arguments = command;
+        arguments.push_back("--help");
+        tool.Run(arguments);
+        const std::string help = tool.Out();
+        arguments = command;
+        arguments.insert(arguments.begin(), "help");
+        EXPECT_EQ(tool.Run(arguments), ExitCode::Success);
+        EXPECT_EQ(tool.Out(), help);
+    }
+    EXPECT_EQ(tool.Run({"help", "eeprom", "chekc"}), ExitCode::Usage);
+    EXPECT_THAT(tool.Err(), HasSubstr("`ostra eeprom` has no command 'chekc'"));
     EXPECT_EQ(tool.Run({"--version"}), ExitCode::Success);
     EXPECT_EQ(tool.Out(), "ostra 1.0.3\n");
 }

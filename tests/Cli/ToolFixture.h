@@ -24,7 +24,8 @@ class ToolRunner {
     Cli::ExitCode Run(const Arguments& arguments) {
         out.str({});
         err.str({});
-        Cli::Surroundings surroundings{out, err, outFacts, errFacts, inputPatience};
+        log.str({});
+        Cli::Surroundings surroundings{out, err, log, outFacts, errFacts, inputPatience};
         Cli::Interruption none;
         return Cli::RunTool(arguments, surroundings, interruption != nullptr ? *interruption : none);
     }
@@ -32,6 +33,8 @@ class ToolRunner {
     void CloseOut() { out.setstate(std::ios::badbit); }
     std::string Out() const { return out.str(); }
     std::string Err() const { return err.str(); }
+    /// The lines of --verbose.
+    std::string Log() const { return log.str(); }
     nlohmann::json Json() const { return nlohmann::json::parse(out.str()); }
     std::vector<std::string> Lines() const {
         std::vector<std::string> lines;
@@ -47,7 +50,7 @@ class ToolRunner {
     Cli::Interruption* interruption = nullptr;
 
   private:
-    std::ostringstream out, err;
+    std::ostringstream out, err, log;
 };
 
 /// The tool on a host with simulated instruments, on both transports, in virtual time.

@@ -355,7 +355,7 @@ TEST_F(Shipped, ProgramsDoTheWholeJob) {
                                                                 : R"("transport":"native")"));
     EXPECT_THAT(printed, HasSubstr(path.substr(path.find("#ostra#"))));
 
-    EXPECT_EQ(RunProgram(Quoted(tool) + " eeprom new C:\\image").first, 0U) << Content(PrintedPath);
+    EXPECT_EQ(RunProgram(Quoted(tool) + " eeprom new C:\\image --force").first, 0U) << Content(PrintedPath);
     const auto [exampleCode, values] =
         RunProgram(Quoted(example) + ' ' + Quoted(ShippedLibrary::path) + " \"\" C:\\image");
     EXPECT_EQ(exampleCode, 0U) << values;

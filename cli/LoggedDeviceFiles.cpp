@@ -1,0 +1,190 @@
+#include "LoggedDeviceFiles.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <optional>
+#include <span>
+#include <utility>
+
+#include "Protocol/ByteOrder.h"
+#include "Protocol/DescribeTransfer.h"
+#include "Protocol/Instrument.h"
+#include "Protocol/NativeDriver.h"
+#include "Protocol/UsbIoDriver.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+namespace Native = Protocol::NativeDriver;
+namespace UsbIo = Protocol::UsbIoDriver;
+
+/// The vendor request that a driver's control asks for.
+struct VendorRequest {
+    std::uint8_t request;
+    std::uint16_t value;
+    bool isIn;
+};
+
+std::optional<VendorRequest> VendorRequestOf(std::uint32_t code, std::span<const std::uint8_t> block) {
+    switch (code) {
+        case Native::ControlVendorRequest:
+        case Native::ControlButtonReport:
+            if (block.size() < Native::ControlBlockSize) {
+                break;
+            }
+            return VendorRequest{block[Native::Block::Request],
+                                 Protocol::LoadLittle16(&block[Native::Block::Value]),
+                                 block[Native::Block::Direction] == Native::DirectionIn};
+        case UsbIo::Control::ClassOrVendorInRequest:
+        case UsbIo::Control::ClassOrVendorOutRequest:
+            if (block.size() < UsbIo::RequestBlock::Size) {
+                break;
+            }
+            return VendorRequest{block[UsbIo::RequestBlock::Request],
+                                 Protocol::LoadLittle16(&block[UsbIo::RequestBlock::Value]),
+                                 code == UsbIo::Control::ClassOrVendorInRequest};
+        default:
+            break;
+    }
+    return std::nullopt;
+}
+
+std::string TextOfFailure(Platform::ErrorCode code) {
+    const bool isWanted = code == Platform::Errors::OperationAborted || code == UsbIo::Status::Cancelled;
+    return isWanted ? ": cancelled" : fmt::format(": failed with code 0x{:X}", code);
+}
+
+}  // namespace
+
+LoggedDeviceFiles::LoggedDeviceFiles(Platform::DeviceFileSystem& underlying, Log tell)
+    : below(underlying), log(std::move(tell)) {}
+
+std::vector<std::string> LoggedDeviceFiles::ListInterfaces(const Protocol::Guid& interfaceClass) {
+    return below.ListInterfaces(interfaceClass);
+}
+
+LoggedDeviceFiles::Handle LoggedDeviceFiles::Open(const std::string& path) {
+    const Handle file = below.Open(path);
+    const std::string interruptPipe = Native::PipeSuffix + std::to_string(Native::InterruptPipe);
+    if (file != Platform::InvalidHandle() && path.ends_with(interruptPipe)) {
+        const Platform::CriticalSection::Holder holder(section);
+        interruptFiles.push_back(file);
+    }
+    return file;
+}
+
+bool LoggedDeviceFiles::CloseFile(Handle file) {
+    {
+        const Platform::CriticalSection::Holder holder(section);
+        std::erase(interruptFiles, file);
+        std::erase_if(running, [file](const RunningTransfer& transfer) { return transfer.file == file; });
+    }
+    return below.CloseFile(file);
+}
+
+void LoggedDeviceFiles::Tell(const Description& describe, std::uint32_t transferred, bool succeeded) {
+    const Platform::ErrorCode code = Platform::LastError();
+    {
+        const Platform::CriticalSection::Holder holder(section);
+        log(describe(transferred) + (succeeded ? "" : TextOfFailure(code)));
+    }
+    Platform::SetLastError(code);
+}
+
+template <class Start>
+bool LoggedDeviceFiles::StartTransfer(Handle file, const Overlapped& record, Description describe,
+                                      Start start) {
+    {
+        // Before the start: its end may be learnt of on another thread.
+        const Platform::CriticalSection::Holder holder(section);
+        std::erase_if(running,
+                      [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
+        running.push_back({&record, file, describe});
+    }
+    const bool completed = start();
+    if (!completed && Platform::LastError() != Platform::Errors::IoPending) {
+        Tell(describe, 0, false);
+        const Platform::ErrorCode code = Platform::LastError();
+        const Platform::CriticalSection::Holder holder(section);
+        std::erase_if(running,
+                      [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
+        Platform::SetLastError(code);
+    }
+    return completed;
+}
+
+bool LoggedDeviceFiles::StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) {
+    bool isInterrupt = false;
+    {
+        const Platform::CriticalSection::Holder holder(section);
+        isInterrupt = std::ranges::find(interruptFiles, file) != interruptFiles.end();
+    }
+    return StartTransfer(
+        file, record,
+        [isInterrupt, length](std::uint32_t transferred) {
+            return fmt::format("{} {} of {}", isInterrupt ? "interrupt" : "bulk in", transferred, length);
+        },
+        [&] { return below.StartRead(file, buffer, length, record); });
+}
+
+bool LoggedDeviceFiles::StartWrite(Handle file, const void* buffer, std::uint32_t length,
+                                   Overlapped& record) {
+    return StartTransfer(
+        file, record,
+        [length](std::uint32_t transferred) { return fmt::format("bulk out {} of {}", transferred, length); },
+        [&] { return below.StartWrite(file, buffer, length, record); });
+}
+
+bool LoggedDeviceFiles::StartControl(Handle file, std::uint32_t code, const void* input,
+                                     std::uint32_t inputSize, void* output, std::uint32_t outputSize,
+                                     Overlapped& record) {
+    const auto* const block = static_cast<const std::uint8_t*>(input);
+    const auto start = [&] {
+        return below.StartControl(file, code, input, inputSize, output, outputSize, record);
+    };
+    if (code == UsbIo::Control::BindPipe && inputSize > 0 && *block == Protocol::InterruptInEndpoint) {
+        const Platform::CriticalSection::Holder holder(section);
+        interruptFiles.push_back(file);
+    }
+    const std::optional<VendorRequest> request = VendorRequestOf(code, {block, inputSize});
+    if (!request) {
+        return start();
+    }
+    return StartTransfer(
+        file, record,
+        [request = *request, data = static_cast<const std::uint8_t*>(output),
+         outputSize](std::uint32_t transferred) {
+            const std::uint32_t known = request.isIn ? std::min(transferred, outputSize) : outputSize;
+            return Protocol::DescribeRequest(request.request, request.value, {data, known});
+        },
+        start);
+}
+
+bool LoggedDeviceFiles::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) {
+    const bool succeeded = below.GetResult(file, record, transferred, wait);
+    const Platform::ErrorCode code = Platform::LastError();
+    if (!succeeded && code == Platform::Errors::IoIncomplete) {
+        return false;
+    }
+    Description describe;
+    {
+        const Platform::CriticalSection::Holder holder(section);
+        const auto found = std::ranges::find(running, &record, &RunningTransfer::record);
+        if (found != running.end()) {
+            describe = std::move(found->describe);
+            running.erase(found);
+        }
+    }
+    Platform::SetLastError(code);
+    if (describe) {
+        Tell(describe, transferred, succeeded);
+    }
+    return succeeded;
+}
+
+bool LoggedDeviceFiles::CancelTransfers(Handle file) {
+    return below.CancelTransfers(file);
+}
+
+}  // namespace Varnholt::Cli
