@@ -1,10 +1,13 @@
 #include "Instrument.h"
 
 #include <algorithm>
+#include <array>
 #include <string_view>
 
+#include "ChipId.h"
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
 #include "Holder.h"
+#include "Output/Json.h"
 #include "SystemCommands.h"
 
 namespace Varnholt::Cli {
@@ -89,7 +92,9 @@ Instrument::Instrument(Session& usedSession, const InstrumentOptions& options, C
     : session(usedSession), messageListener(listener) {
     session.UseTransport(options.transport);
     const std::vector<std::string> connected = ConnectedInstruments();
-    const std::size_t index = FindInstrument(connected, options.device);
+    const bool byChip = NamesChip(options.device) && !connected.empty();
+    const std::size_t index =
+        FindInstrument(connected, byChip ? FindByChipId(session, connected, options) : options.device);
     identifier = connected[index];
     if (options.device.empty() && connected.size() > 1) {
         if (choice == Choice::MustBeNamed) {
@@ -124,6 +129,12 @@ Instrument::Instrument(Session& usedSession, const InstrumentOptions& options, C
                           "try again");
     }
     session.SetInstrumentInUse(identifier);
+}
+
+std::string Instrument::ChipId() {
+    std::array<std::uint8_t, 8> id{};
+    transport->GetChipID(id.data());
+    return HexOf(id);
 }
 
 Instrument::~Instrument() {

@@ -12,7 +12,7 @@ namespace Varnholt::Cli {
 
 /// Which instrument a command works on, and how it reaches it.
 struct InstrumentOptions {
-    std::string device;     ///< identifier or the end of one; empty: the first
+    std::string device;     ///< identifier or the end of one, or "chip:" and a chip id; empty: the first
     std::string transport;  ///< "native", "usbio" or empty
 };
 
@@ -48,6 +48,8 @@ class Instrument final {
     Instrument& operator=(const Instrument&) = delete;
 
     const std::string& Identifier() const { return identifier; }
+    /// Asks for what the chip calls itself: 16 hexadecimal digits, the same at whatever port.
+    std::string ChipId();
     CommandSet& Commands() { return *commands; }
     const Utilities::Tools::SmartPointer<CommandSet>& SharedCommands() const { return commands; }
     /// The commands at byte level, for what the command set does not offer.

@@ -8,7 +8,8 @@ constexpr const char* Heading = "Instrument";
 void AddInstrumentOptions(CommandSpec command, InstrumentOptions& options) {
     command
         .Add("-d,--device", options.device,
-             "instrument: its identifier or the end of it, as `ostra list` shows (default: the first)")
+             "instrument: its identifier or the end of it, as `ostra list` shows, or chip:ID (default: the "
+             "first)")
         .Type("NAME")
         .Group(Heading);
     AddTransportOption(command, options);

@@ -16,7 +16,7 @@ struct Options {
 };
 
 struct Identity {
-    std::array<std::uint8_t, 8> chipId{};
+    std::string chipId;
     std::uint8_t misc1 = 0, misc3 = 0;
     std::uint16_t misc2 = 0, misc4 = 0, misc5 = 0;
     std::array<std::uint8_t, 6> mode{};
@@ -28,7 +28,7 @@ struct Identity {
 Identity Ask(Instrument& instrument) {
     Identity found;
     Instrument::CommandSet& commands = instrument.Commands();
-    instrument.Bytes().GetChipID(found.chipId.data());
+    found.chipId = instrument.ChipId();
     commands.GetMISC(found.misc1, found.misc2, found.misc3, found.misc4, found.misc5);
     auto& mode = found.mode;
     commands.GetMeasureMode(mode[0], mode[1], mode[2], mode[3], mode[4], mode[5]);
@@ -43,7 +43,7 @@ void Identify(Session& session, const Options& options) {
     if (options.json) {
         session.Print({{"identifier", instrument.Identifier()},
                        {"name", ShortNameOf(instrument.Identifier())},
-                       {"chipId", HexOf(found.chipId)},
+                       {"chipId", found.chipId},
                        {"misc", {found.misc1, found.misc2, found.misc3, found.misc4, found.misc5}},
                        {"mode", found.mode},
                        {"cpld", found.cpld},
@@ -53,7 +53,7 @@ void Identify(Session& session, const Options& options) {
     Table table({{}, {}});
     table.AddRow({"identifier", instrument.Identifier()});
     table.AddRow({"name", ShortNameOf(instrument.Identifier())});
-    table.AddRow({"chip id", HexOf(found.chipId)});
+    table.AddRow({"chip id", found.chipId});
     table.AddRow({"MISC m1 to m5", fmt::format("{}  {}  {}  {}  {}", found.misc1, found.misc2, found.misc3,
                                                found.misc4, found.misc5)});
     table.AddRow({"mode m1 to m6", fmt::format("{}", fmt::join(found.mode, "  "))});

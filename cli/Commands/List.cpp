@@ -1,3 +1,6 @@
+#include <optional>
+
+#include "ChipId.h"
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
@@ -11,6 +14,7 @@ namespace {
 struct Options {
     InstrumentOptions instrument;
     bool candidates = false;
+    bool chipId = false;
     bool json = false;
 };
 
@@ -23,10 +27,27 @@ void List(Session& session, const Options& options) {
     const std::string transport = Utilities::Tools::Is64BitOS() ? "usbio" : "native";
     const std::vector<std::string> connected = ConnectedInstruments();
     Json instruments = Json::array();
-    Table table({{"NAME"}, {"IDENTIFIER"}});
+    Table table({{"NAME"}, {"IDENTIFIER"}, {options.chipId ? "CHIP ID" : ""}});
+    std::optional<FailureReport> failure;  // one that is used by others is none
     for (const std::string& identifier : connected) {
-        instruments.push_back({{"identifier", identifier}, {"name", ShortNameOf(identifier)}});
-        table.AddRow({ShortNameOf(identifier), identifier});
+        Json instrument{{"identifier", identifier}, {"name", ShortNameOf(identifier)}};
+        std::string chipId;
+        if (options.chipId) {
+            const ChipIdAnswer answer = AskChipId(session, identifier, options.instrument.transport);
+            const FailureReport& problem = answer.problem;
+            chipId = answer.chipId;
+            instrument["chipId"] = chipId.empty() ? Json(nullptr) : Json(chipId);
+            if (chipId.empty()) {
+                chipId = "(not asked)";
+                instrument["problem"] = problem.message;
+                session.Warn(problem.message);
+                if (problem.code != ExitCode::NotAvailable && !failure) {
+                    failure = problem;
+                }
+            }
+        }
+        instruments.push_back(instrument);
+        table.AddRow({ShortNameOf(identifier), identifier, chipId});
     }
     if (options.json) {
         session.Print({{"transport", transport}, {"instruments", instruments}});
@@ -34,6 +55,9 @@ void List(Session& session, const Options& options) {
         table.Print(session.Out());
     }
     FindInstrument(connected, {});  // says what to do when there is none
+    if (failure) {
+        throw ToolFailure(failure->code, "not every instrument has told its chip id", failure->advice);
+    }
 }
 
 }  // namespace
@@ -44,6 +68,10 @@ void AddList(CommandSpec app, Session& session) {
     AddTransportOption(command, options->instrument);
     command.AddFlag("--candidates", options->candidates,
                     "show the USB devices that could be instruments instead, registered or not");
+    command
+        .AddFlag("--chip-id", options->chipId,
+                 "show the chip ids as well: opens (and thereby resets) the instruments that are free")
+        .Excludes("--candidates");
     AddJsonFlag(command, options->json);
     SetAction(command, session, options, List);
 }

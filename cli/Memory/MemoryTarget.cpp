@@ -26,8 +26,8 @@ void RefuseToChangeInPlace(const std::string& file) {
     }
 }
 
-/// A name that tells instrument and time, and that no file has yet.
-std::string NewBackupName(const std::string& identifier) {
+/// A name that tells instrument, chip and time, and that no file has yet.
+std::string NewBackupName(const std::string& identifier, const std::string& chipId) {
     std::string name = ShortNameOf(identifier);
     for (char& c : name) {
         const bool isPlain = (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
@@ -35,8 +35,8 @@ std::string NewBackupName(const std::string& identifier) {
         c = isPlain ? c : '_';
     }
     const Platform::CalendarTime now = Platform::LocalCalendarTime(Platform::WallClockNow().seconds);
-    const std::string base = fmt::format("ostra-{}-{:04}{:02}{:02}-{:02}{:02}{:02}", name, now.year,
-                                         now.month, now.day, now.hour, now.minute, now.second);
+    const std::string base = fmt::format("ostra-{}-{}-{:04}{:02}{:02}-{:02}{:02}{:02}", name, chipId,
+                                         now.year, now.month, now.day, now.hour, now.minute, now.second);
     std::error_code error;
     for (int number = 1;; ++number) {
         const std::string candidate = base + (number == 1 ? "" : fmt::format("-{}", number)) + ".eeprom";
@@ -111,7 +111,7 @@ ToolFailure MemoryTarget::Unusable(const std::string& reason) const {
             "`ostra eeprom check " + which + "` tells what is wrong with it"};
 }
 
-std::string MemoryTarget::MakeBackup(const ChangeOptions& options) const {
+std::string MemoryTarget::MakeBackup(const ChangeOptions& options) {
     if (options.noBackup) {
         return {};
     }
@@ -125,7 +125,7 @@ std::string MemoryTarget::MakeBackup(const ChangeOptions& options) const {
     if (!backup.empty()) {
         WriteFileAtomically(backup, image, AtomicFile::IfItExists::Refuse);
     } else {
-        backup = NewBackupName(name);
+        backup = NewBackupName(name, instrument->ChipId());
         try {
             WriteFileAtomically(backup, image, AtomicFile::IfItExists::Refuse);
         } catch (const ToolFailure& failure) {

@@ -73,7 +73,7 @@ class MemoryTarget final {
 
   private:
     ToolFailure Unusable(const std::string& reason) const;
-    std::string MakeBackup(const ChangeOptions& options) const;
+    std::string MakeBackup(const ChangeOptions& options);
     std::string WayBack(const std::string& backup) const;
 
     Session& session;

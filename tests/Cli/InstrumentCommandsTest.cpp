@@ -357,6 +357,35 @@ TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
     }
 }
 
+TEST_P(InstrumentCommandsTest, ChipsTellInstrumentsApart) {
+    InstrumentSettings settings;
+    settings.chipId = {1, 2, 3, 4, 5, 6, 7, 8};
+    auto& left = host.Add("left");
+    host.Add("right", settings);
+    Succeed({"list", "--chip-id"});
+    EXPECT_THAT(tool.Lines()[2], testing::AllOf(HasSubstr("right"), HasSubstr("0102030405060708")));
+    Succeed({"identify", "--device", "chip:5A0123456789ABCD", "--json"});
+    EXPECT_EQ(tool.Json()["name"], "left");
+
+    ASSERT_EQ(left.Claim(), Platform::Errors::Success);
+    Succeed({"list", "--chip-id", "--json"});
+    const auto instruments = tool.Json()["instruments"];
+    EXPECT_EQ(instruments[0]["chipId"], nullptr);
+    EXPECT_THAT(instruments[0]["problem"].get<std::string>(), HasSubstr("used by another process"));
+    EXPECT_EQ(instruments[1]["chipId"], "0102030405060708");
+    Succeed({"identify", "-d", "chip:0102030405060708", "--json"});
+    EXPECT_EQ(tool.Json()["name"], "right");
+    Fail({"identify", "-d", "chip:5a0123456789abcd"}, ExitCode::NotAvailable,
+         Identifier("left") + ": the instrument is used");
+    left.Release();
+
+    Fail({"identify", "-d", "chip:5a0123456789abce"}, ExitCode::NoInstrument, "chip:5a0123456789abce");
+    Fail({"identify", "-d", "chip:5a"}, ExitCode::Usage, "16 hexadecimal digits");
+    host.Bus().SetFaults("left", Simulator::FaultPlan::Parse("control 0+:stall"));
+    Fail({"list", "--chip-id", "--json"}, ExitCode::InputOutput, Identifier("left"));
+    EXPECT_EQ(tool.Json()["instruments"].size(), 2u);
+}
+
 TEST_P(InstrumentCommandsTest, VerboseTellsWhatIsSent) {
     host.Add("sim");
     const auto told = [this] {

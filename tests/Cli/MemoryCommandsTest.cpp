@@ -152,7 +152,7 @@ TEST_P(MemoryCommandsTest, BackupsGetANameOfTheirOwn) {
     Succeed({"calibration", "set", "1211=6", "--json"});
     const std::string second = tool.Json()["backup"];
     std::filesystem::current_path(previous);
-    EXPECT_TRUE(first.starts_with("ostra-sim-") && first.ends_with(".eeprom")) << first;
+    EXPECT_TRUE(first.starts_with("ostra-sim-5a0123456789abcd-") && first.ends_with(".eeprom")) << first;
     EXPECT_EQ(ReadFile(folder.Path(first)), before);
     EXPECT_EQ(ReadFile(folder.Path(second)), Calibrated("5"));
 }
