@@ -39,7 +39,8 @@ struct Command {
 
 const std::vector<Command>& Commands() {
     static const std::vector<Command> commands{
-        {"Identify", {"identify"}, Data::Trusted},
+        {"ListChipIds", {"list", "--chip-id"}, Data::Trusted},
+        {"IdentifyChip", {"identify", "--device", "chip:5a0123456789abcd"}, Data::Trusted},
         {"Reset", {"reset"}, Data::Trusted},
         {"Readout", {"readout"}, Data::Trusted},
         {"ReadoutInTime", {"readout", "--integration-time", "0.01"}, Data::Trusted},
