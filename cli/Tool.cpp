@@ -2,6 +2,8 @@
 
 #include <algorithm>
 #include <CLI/CLI.hpp>
+#include <numeric>
+#include <set>
 #include <sstream>
 
 #include "Commands/Commands.h"
@@ -30,8 +32,24 @@ Exit codes:
   130  interrupted (Ctrl-C)
 )";
 
-/// An argument that is an option as well is described once.
+/// An argument that is an option as well is described once, and the same help is printed each time: the
+/// parser keeps what an option excludes in the order of addresses.
 class HelpFormatter final : public CLI::Formatter {
+    std::string make_option_opts(const CLI::Option* option) const override {
+        const std::string text = Formatter::make_option_opts(option);
+        const std::string label = " " + get_label("Excludes") + ":";
+        const std::size_t at = text.find(label);
+        if (at == std::string::npos) {
+            return text;
+        }
+        std::set<std::string> names;
+        for (const CLI::Option* const other : option->get_excludes()) {
+            names.insert(other->get_name());
+        }
+        return std::accumulate(
+            names.begin(), names.end(), text.substr(0, at) + label,
+            [](const std::string& before, const std::string& name) { return before + " " + name; });
+    }
     std::string make_option(const CLI::Option* option, bool isPositional) const override {
         if (!isPositional || option->get_lnames().empty()) {
             return Formatter::make_option(option, isPositional);
