@@ -40,8 +40,8 @@ class StdExceptionAdapter : public X {
 template <std::derived_from<std::exception> X>
 class ExceptionAdapter : public StdExceptionAdapter<X>, public TraceableExceptionAdapter {
   public:
-    ExceptionAdapter(const std::string& message, const std::string& location)
-        : StdExceptionAdapter<X>(message), TraceableExceptionAdapter(location) {}
+    ExceptionAdapter(const std::string& message, const std::string& location, const Cause& recorded = {})
+        : StdExceptionAdapter<X>(message), TraceableExceptionAdapter(location, recorded) {}
 
     const char* what() const noexcept override {
         if (!IsVerboseText()) {

@@ -7,9 +7,9 @@
 #include "Utilities/Exceptions/Location.h"
 #include "Utilities/Tools/TypeName.h"
 
-/// The general exception classes. Each is built from a message and a location (see `Here`), thrown by value
-/// and caught by reference. `RuntimeException` and what lies below it is what the exported functions report
-/// by text.
+/// The general exception classes. Each is built from a message, a location (see `Here`) and, if it has one, a
+/// cause; it is thrown by value and caught by reference. `RuntimeException` and what lies below it is what
+/// the exported functions report by text.
 namespace Varnholt::Utilities::Exceptions {
 
 class RuntimeException : public ExceptionAdapter<std::runtime_error> {

@@ -13,7 +13,9 @@ namespace Varnholt::Utilities::Exceptions {
 void SetVerboseText(bool verbose);
 bool IsVerboseText();
 
-/// Root of the library's exceptions: carries the locations it has passed on its way up, throw site first.
+/// Root of the library's exceptions: carries the locations it has passed on its way up, throw site first, and
+/// the cause that it was made with. The library's own exceptions have none: it is for those who catch one
+/// exception and throw another.
 class TraceableException {
   public:
     virtual ~TraceableException() = default;
@@ -21,13 +23,16 @@ class TraceableException {
 
     void AddLocation(const std::string& location) { trace.push_back(location); }
     const std::list<std::string>& GetTrace() const noexcept { return trace; }
+    /// Empty where none was recorded.
+    const Cause& GetCause() const noexcept { return cause; }
 
     /// Writes the trace, each entry behind a tab, entries separated by newlines; empty entries write nothing.
     /// The cause follows where there is one.
     void Print(std::ostream& stream) const;
 
   protected:
-    explicit TraceableException(const std::string& location) : trace{location} {}
+    explicit TraceableException(const std::string& location, const Cause& recorded = {})
+        : trace{location}, cause(recorded) {}
     TraceableException(const TraceableException&) = default;
     TraceableException& operator=(const TraceableException&) = default;
 

@@ -151,6 +151,12 @@ TEST(Exceptions, CauseIsASnapshot) {
         EXPECT_EQ(text.str(), expected);
         EXPECT_STREQ(cause.what(), expected.empty() ? "" : "message");
         EXPECT_EQ(cause.IsEmpty(), expected.empty());
+
+        const BadAllocException recorded("", "B", cause);
+        EXPECT_EQ(recorded.GetCause().IsEmpty(), expected.empty());
+        SetVerboseText(true);
+        EXPECT_EQ(recorded.what(), "bad allocation\n\tB" + expected);
+        SetVerboseText(false);
     }
 }
 

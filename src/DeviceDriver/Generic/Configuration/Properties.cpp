@@ -26,6 +26,9 @@ auto Find(Store& datastore, std::uint16_t id) {
 
 }  // namespace
 
+Properties::Properties(const std::string& nameOfCollection) try : name(nameOfCollection) {}
+TRACED
+
 void Properties::SetName(const std::string& newName) try { name = newName; }
 TRACED
 

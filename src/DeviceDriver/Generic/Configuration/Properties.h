@@ -18,7 +18,7 @@ class Properties final {
     using Datastore = std::list<std::pair<std::uint16_t, Property>>;
 
     Properties() = default;
-    explicit Properties(const std::string& nameOfCollection) : name(nameOfCollection) {}
+    explicit Properties(const std::string& nameOfCollection);
 
     const std::string& GetName() const { return name; }
     void SetName(const std::string& newName);

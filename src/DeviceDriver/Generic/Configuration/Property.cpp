@@ -16,12 +16,23 @@ constexpr const char* InvalidType = "Invalid configuration data type.";
 
 }  // namespace
 
-Property::Property(const std::vector<float>& values) : floats(values), type(TypeFloatVector) {}
-Property::Property(const std::vector<std::int32_t>& values) : longs(values), type(TypeLongVector) {}
-Property::Property(float value) : floats(1, value), type(TypeFloat) {}
-Property::Property(std::int32_t value) : longs(1, value), type(TypeLong) {}
-Property::Property(std::int16_t value) : Property(std::int32_t{value}) {}
-Property::Property(std::int8_t value) : Property(std::int32_t{value}) {}
+Property::Property(const std::vector<float>& values) try : floats(values), type(TypeFloatVector) {}
+TRACED
+
+Property::Property(const std::vector<std::int32_t>& values) try : longs(values), type(TypeLongVector) {}
+TRACED
+
+Property::Property(float value) try : floats(1, value), type(TypeFloat) {}
+TRACED
+
+Property::Property(std::int32_t value) try : longs(1, value), type(TypeLong) {}
+TRACED
+
+Property::Property(std::int16_t value) try : longs(1, value), type(TypeLong) {}
+TRACED
+
+Property::Property(std::int8_t value) try : longs(1, value), type(TypeLong) {}
+TRACED
 
 Property& Property::Assign(float value) try {
     AssignInternal(std::vector<float>(1, value), TypeFloat);
@@ -35,12 +46,17 @@ Property& Property::Assign(std::int32_t value) try {
 }
 TRACED
 
-Property& Property::Assign(std::int16_t value) {
-    return Assign(std::int32_t{value});
+Property& Property::Assign(std::int16_t value) try {
+    AssignInternal(std::vector<std::int32_t>(1, value), TypeLong);
+    return *this;
 }
-Property& Property::Assign(std::int8_t value) {
-    return Assign(std::int32_t{value});
+TRACED
+
+Property& Property::Assign(std::int8_t value) try {
+    AssignInternal(std::vector<std::int32_t>(1, value), TypeLong);
+    return *this;
 }
+TRACED
 
 Property& Property::Assign(const std::vector<float>& values) try {
     AssignInternal(values, TypeFloatVector);
