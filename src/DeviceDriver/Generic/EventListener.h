@@ -4,7 +4,8 @@
 
 namespace Varnholt::DeviceDriver::Generic {
 
-/// Codes of `EventListener::MessageFromDevice`; the parameter is 0 with both.
+/// Codes of `EventListener::MessageFromDevice`; the parameter is 0 with both. That the device is gone is not
+/// said while it is being closed, although closing ends the interrupt pipe as well.
 inline constexpr std::uint32_t MessageDeviceGone = 20010;
 inline constexpr std::uint32_t MessageButtonData = 20011;
 

@@ -217,6 +217,23 @@ TYPED_TEST(InterruptListeners, SayWhenTheThreadCannotBeMade) {
     this->StopWithin(0);
 }
 
+TYPED_TEST(InterruptListeners, WorkOnTheCallersThreadToo) {
+    this->Script({Press, Gone});
+    this->listener->SetListener(&this->receiver);
+    this->listener->Listen();
+    this->listener->DispatchEvent(1);
+    this->listener->DispatchEvent(0);
+    EXPECT_THAT(this->receiver.Codes(), ElementsAre(MessageButtonData, MessageButtonData))
+        << "nothing was started whose end would be news";
+
+    this->listener = TypeParam::Make(this->pipe);
+    this->Script({Silence});
+    this->Start();
+    this->Start();  // once is enough
+    this->StopWithin(1);
+    EXPECT_EQ(this->driver.Running(this->Place), 0U);
+}
+
 using NativeInterruptListener = InterruptListeners<OverNative>;
 const std::string InterruptPath = "native/1\\PIPE03";
 

@@ -30,7 +30,8 @@ class InterruptListener::Watch final : public InterruptWatch {
         }
     }
 
-  private:
+    using InterruptWatch::DispatchEvent;
+
     void Listen() override {
         try {
             ReadUntilTheEnd();
@@ -38,6 +39,8 @@ class InterruptListener::Watch final : public InterruptWatch {
         }
         ClosePipe();
     }
+
+  private:
     void ClosePipe() override {
         if (const std::shared_ptr<USBConnection> closing = ExchangePipe(nullptr)) {
             closing->Close();
@@ -93,6 +96,9 @@ bool InterruptListener::IsTouched() const try { return watch->IsTouched(); }
 TRACED
 
 void InterruptListener::Start() try {
+    if (thread) {
+        return;
+    }
     thread = watch->Launch();
     if (!thread) {
         throw IOException("could not create interrupt listener thread", Here());
@@ -108,6 +114,12 @@ void InterruptListener::Stop() try {
         watch->End(thread);
     }
 }
+TRACED
+
+void InterruptListener::Listen() try { watch->Listen(); }
+TRACED
+
+void InterruptListener::DispatchEvent(std::uint32_t count) try { watch->DispatchEvent(count); }
 TRACED
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <memory>
 #include <string>
 
@@ -9,7 +10,9 @@
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 /// Watches the instrument's interrupt pipe on a thread of its own and turns what it sees into messages:
-/// 20011 for interrupt data, 20010 once when the pipe stops delivering while nobody asked for an end.
+/// 20011 for interrupt data, 20010 once when the pipe stops delivering while nobody asked for an end. A read
+/// that is refused, with any code, ends the thread as one does that brings nothing: a pipe that refuses one
+/// refuses the next.
 ///
 /// One owner starts and stops it; the accessors may be called from any thread, also from inside a message.
 /// A message is delivered with no lock of the listener held, so a message that was under way when
@@ -33,12 +36,19 @@ class InterruptListener final {
     bool IsTouched() const;
 
     /// Returns when the thread has opened the pipe. `IOException` when the thread cannot be made or does not
-    /// report within 2000 ms; it may then still run and is to be stopped.
+    /// report within 2000 ms; it may then still run and is to be stopped. Harmless when it was started.
     void Start();
     /// Ends the thread within 11 s. A thread that does not end is ended by force; where the platform cannot,
     /// it is left to itself with everything it uses. Called from inside a message it asks for the end and
     /// does not wait. Harmless without a thread.
     void Stop();
+
+    /// The thread's body, on the calling thread: opens the pipe and reads it until the end is requested or
+    /// the pipe delivers nothing more. What goes wrong ends it and is kept to itself.
+    void Listen();
+    /// The message that follows from a read of so many bytes: 20011, or for 0 bytes, while the thread runs
+    /// and nobody has asked for its end, 20010.
+    void DispatchEvent(std::uint32_t count);
 
   private:
     class Watch;

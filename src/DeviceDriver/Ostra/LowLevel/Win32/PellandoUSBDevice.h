@@ -32,7 +32,7 @@ class PellandoUSBDevice final : public Generic::EventListener {
   public:
     /// `listener` may be null; it is not owned and must live until it is removed or the device is closed.
     PellandoUSBDevice(Generic::EventListener* listener, const std::string& devicePath);
-    /// Closes the instrument within bounded time; may be called from inside a message.
+    /// `Shutdown`, and closes the pipes; within bounded time. May be called from inside a message.
     ~PellandoUSBDevice() override;
     PellandoUSBDevice(const PellandoUSBDevice&) = delete;
     PellandoUSBDevice& operator=(const PellandoUSBDevice&) = delete;
@@ -70,6 +70,15 @@ class PellandoUSBDevice final : public Generic::EventListener {
     /// `text` without everything that is not an ASCII letter or digit.
     static std::string StripStrangeChars(const std::string& text);
 
+    /// Makes this object the interrupt listener's receiver and starts it, as the constructor does; harmless
+    /// when it runs.
+    void SetupInterruptListener();
+    /// Says farewell to the instrument and stops the interrupt listener. The pipes stay open. From here on
+    /// the end of the interrupt pipe is no news: no message of 20010 is passed on.
+    void Shutdown();
+    /// Two controls for an instrument whose button was never pressed. Takes no lock and reports no failure.
+    void HandleUntouchedButton();
+
   private:
     class Core;
     /// What becomes of the data of a transfer that failed.
@@ -80,9 +89,6 @@ class PellandoUSBDevice final : public Generic::EventListener {
     void ReadCountedStrip(ScanReceiver& receiver, PartialData partialData, std::uint32_t recordSize,
                           std::uint32_t timeout, std::uint32_t total);
     static void HandOverPartialData(StripReader& reader, ScanReceiver& receiver, PartialData partialData);
-    void SetupInterruptListener();
-    void Shutdown();
-    void HandleUntouchedButton();
 
     const std::shared_ptr<Core> core;  ///< with the listener's thread, while that delivers a message
     InterruptListener interruptListener;

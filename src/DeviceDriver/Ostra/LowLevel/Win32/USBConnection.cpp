@@ -29,8 +29,8 @@ std::string TextOf(Platform::ErrorCode code) {
 }  // namespace
 
 USBConnection::USBConnection(const std::string& path, std::uint32_t pipe, Platform::Handle event) try
-    : pipeNumber(pipe), sharedEvent(event == Platform::InvalidHandle() ? NoHandle : event), devicePath(path) {
-    OpenConnection();
+    : pipeNumber(pipe), devicePath(path) {
+    OpenConnection(event);
 }
 TRACED
 
@@ -38,7 +38,9 @@ USBConnection::~USBConnection() {
     Close();
 }
 
-void USBConnection::OpenConnection() try {
+void USBConnection::OpenConnection(Platform::Handle event) try {
+    Close();
+    sharedEvent = event == Platform::InvalidHandle() ? NoHandle : event;
     const std::string suffix = pipeNumber == Protocol::NativeDriver::ControlPipe
                                    ? std::string()
                                    : Protocol::NativeDriver::PipeSuffix + std::to_string(pipeNumber);

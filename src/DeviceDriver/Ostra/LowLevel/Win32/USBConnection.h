@@ -44,9 +44,9 @@ class USBConnection final {
     void Read(void* buffer, std::uint32_t length, std::uint32_t timeout);
     void Write(const void* buffer, std::uint32_t length, std::uint32_t timeout);
 
-    /// Reads at most the vector's size, waiting without limit; gives the bytes read. 0 when the read could
-    /// not be started or gave nothing, also because someone else signalled the event. `IOException` when the
-    /// wait fails.
+    /// Reads at most the vector's size, waiting without limit; gives the bytes read. 0 when the read was
+    /// refused, with any code and not only for want of access, as nothing would end the wait; and when it
+    /// gave nothing, also because someone else signalled the event. `IOException` when the wait fails.
     ///
     /// The start of a read resets the event. Who signals it to end the read, whether that has started or not,
     /// sets `endRequested` before.
@@ -56,15 +56,21 @@ class USBConnection final {
     Platform::Handle PipeHandle() const noexcept { return pipeHandle; }
     Platform::Handle CompletionEvent() const noexcept { return sharedEvent ? sharedEvent : ownEvent.load(); }
 
-  private:
-    void OpenConnection();
+    // The parts of the above.
+
+    /// Opens the pipe, and makes an event where none is handed in; what was open is closed before.
+    void OpenConnection(Platform::Handle event);
+    /// The caller owns the handle. `IOException` "could not open pipe:" and the error's text.
     static Platform::Handle OpenPipe(const std::string& name);
+    /// Waits for a transfer that was started, and checks it; `name` begins the text of a failure.
     static void CompleteOverlappedIO(Platform::OverlappedRequest& request, std::uint32_t expected,
                                      std::uint32_t timeout, const std::string& name);
+    /// The text of this thread's last error, as failures append it.
     static std::string GetErrorText();
 
+  private:
     const std::uint32_t pipeNumber;
-    const Platform::Handle sharedEvent;
+    Platform::Handle sharedEvent = Platform::NoHandle;
     // Atomic because `Close` may come from another thread; whoever takes a handle out closes it.
     std::atomic<Platform::Handle> pipeHandle = Platform::NoHandle;
     std::atomic<Platform::Handle> ownEvent = Platform::NoHandle;

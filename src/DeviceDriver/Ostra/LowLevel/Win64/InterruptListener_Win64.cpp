@@ -50,10 +50,15 @@ class InterruptListener_Win64::Watch final : public InterruptWatch {
         InterruptWatch::SetReceiver(std::shared_ptr<EventListener>(std::shared_ptr<void>(), receiver));
     }
 
+    void Listen() override;
+    void Deliver(std::uint32_t count) {
+        const ScopedLock delivering(deliveryLock);
+        DispatchEvent(count);
+    }
+
   private:
     enum class Outcome { Nothing, Data, Failed };
 
-    void Listen() override;
     void ClosePipe() override { pipe->Close(); }
     Outcome Read(std::uint32_t limit);
 
@@ -67,8 +72,7 @@ void InterruptListener_Win64::Watch::Listen() {
     while (!EndRequested()) {
         const Outcome outcome = Read(ReadLimit);
         if (outcome != Outcome::Nothing) {
-            const ScopedLock delivering(deliveryLock);
-            DispatchEvent(outcome == Outcome::Data ? 1 : 0);
+            Deliver(outcome == Outcome::Data ? 1 : 0);
         }
         if (outcome == Outcome::Failed) {
             break;
@@ -110,6 +114,9 @@ bool InterruptListener_Win64::IsTouched() const try { return watch->IsTouched();
 TRACED
 
 void InterruptListener_Win64::Start() try {
+    if (thread) {
+        return;
+    }
     watch->SetPipe(&*pipe);
     thread = watch->Launch();
     if (!thread) {
@@ -126,6 +133,15 @@ void InterruptListener_Win64::Stop() try {
         KeepForever(pipe);
     }
 }
+TRACED
+
+void InterruptListener_Win64::Listen() try {
+    watch->SetPipe(&*pipe);
+    watch->Listen();
+}
+TRACED
+
+void InterruptListener_Win64::DispatchEvent(std::uint32_t count) try { watch->Deliver(count); }
 TRACED
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -31,6 +31,19 @@ TEST_F(UsbConnection, ThatCannotBeMadeLeavesNothingOpen) {
     EXPECT_EQ(driver.OpenFiles(), 0u);
 }
 
+TEST_F(UsbConnection, ThatIsOpenedAnewLetsGoOfWhatWasOpen) {
+    const OwnedHandle event(MakeAutoResetEvent());
+    {
+        USBConnection connection("native/1", 1, NoHandle);
+        EXPECT_NE(connection.CompletionEvent(), event.Get());
+        connection.OpenConnection(event.Get());
+        EXPECT_EQ(connection.CompletionEvent(), event.Get());
+        EXPECT_EQ(driver.OpenFiles(), 1u);
+    }
+    EXPECT_EQ(driver.OpenFiles(), 0u);
+    EXPECT_TRUE(SignalEvent(event.Get())) << "which is its owner's";
+}
+
 void Read64(USBConnection& connection) {
     const auto buffer = std::make_unique<std::uint8_t[]>(64);
     connection.Read(buffer.get(), 64, 64);
