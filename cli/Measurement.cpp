@@ -17,7 +17,7 @@ constexpr std::size_t ParameterCount = 4;
 
 /// With the fixed parameters but for the time.
 void SetIntegrationTime(Instrument& instrument, double seconds) {
-    RamAccess ram(instrument);
+    RamAccess ram(instrument.SharedCommands());
     auto set = ram.Load();
     set.SetProperty(Ids::IntegrationTime, Property(static_cast<float>(seconds)));
     set.SetProperty(Ids::SecondTime, Property(0.0F));
@@ -103,7 +103,7 @@ MeasurementFacts FactsOf(Instrument& instrument, const MeasurementOptions& optio
         std::uint8_t p5 = 0;
         instrument.Commands().GetMeasureParameters(facts.p1, facts.p2, facts.p3, facts.p4, p5);
     }
-    facts.integrationTime = facts.p1 * RamAccess(instrument).TimeUnit();
+    facts.integrationTime = facts.p1 * RamAccess(instrument.SharedCommands()).TimeUnit();
     return facts;
 }
 

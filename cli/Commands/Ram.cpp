@@ -66,7 +66,7 @@ void PrintSet(Session& session, const RamAccess::Properties& set) {
 
 void Show(Session& session, const ShowOptions& options) {
     Instrument instrument(session, options.instrument);
-    const auto set = RamAccess(instrument).Load();
+    const auto set = RamAccess(instrument.SharedCommands()).Load();
     if (options.json) {
         session.Print({{"identifier", instrument.Identifier()}, {"ram", JsonOf(set)}});
     } else {
@@ -145,7 +145,7 @@ std::vector<std::uint16_t> IdsToShow(const std::vector<Assignment>& assignments,
 void Set(Session& session, const SetOptions& options) {
     const std::vector<Assignment> assignments = ParseAssignments(options.assignments);
     Instrument instrument(session, options.instrument);
-    RamAccess ram(instrument);
+    RamAccess ram(instrument.SharedCommands());
     const auto before = ram.Load();
     auto set = Changed(before, assignments);
     if (!options.dryRun) {

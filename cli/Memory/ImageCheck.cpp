@@ -65,10 +65,10 @@ class Checker final {
 
     std::vector<ImageFinding> Run() {
         if (CheckHeader()) {
-            const PellandoEAT table(image.begin() + Map::Table);
+            const PellandoEAT table = TableOf(image);
             CheckEntries(table);
             CheckPlaces(table);
-            CheckModel();
+            CheckModel(table);
         }
         CheckOtherAreas();
         return std::move(findings);
@@ -195,19 +195,36 @@ class Checker final {
         }
     }
 
-    void CheckModel() {
+    void CheckModel(const PellandoEAT& table) {
         try {
             ImageModel model(image);
             CheckLogs();
             CheckCalibration(model.Calibration());
-            try {
-                model.Get().Dump();
-            } catch (const Utilities::Exceptions::RuntimeException& exception) {
-                Add(Severity::Warning, TableArea,
-                    std::string("calibration values cannot be changed: ") + exception.what());
-            }
+            CheckWriting(table, model);
         } catch (const Utilities::Exceptions::RuntimeException& exception) {
             Add(Severity::Error, TableArea, std::string("the driver refuses the image: ") + exception.what());
+        }
+    }
+
+    /// The driver writes each section from the beginning of its area on, whatever the table says, and the log
+    /// whenever an object of its memory model ends.
+    void CheckWriting(const PellandoEAT& table, ImageModel& model) {
+        const Properties log = model.Log();
+        const LogPlaces places = PlacesOf(table, log);
+        if (!places.main) {
+            Add(Severity::Error, LogArea, "the table has it elsewhere than the driver writes it");
+        } else if (!places.second) {
+            Add(Severity::Warning, LogArea,
+                "the table has the second copy elsewhere than the driver writes it");
+        }
+        if (const std::size_t size = log.SizeOf(true); size > Map::LogSize) {
+            Add(size > Map::LogArea ? Severity::Error : Severity::Warning, LogArea,
+                "it reaches into the binary block");
+        }
+        if (!table.Locates(model.Calibration(), Map::Calibration, 0)) {
+            Add(Severity::Warning, TableArea,
+                "calibration values cannot be changed: the table has them elsewhere than the driver writes "
+                "them");
         }
     }
 

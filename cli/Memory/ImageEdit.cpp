@@ -32,11 +32,6 @@ bool HaveSameBytes(const Properties& a, const Properties& b) {
                       });
 }
 
-void CopyRange(const EepromImage& from, EepromImage& to, std::size_t first, std::size_t count) {
-    const auto offset = static_cast<std::ptrdiff_t>(first);
-    std::copy_n(from.begin() + offset, count, to.begin() + offset);
-}
-
 [[noreturn]] void RefuseOddTable() {
     throw ToolFailure(
         ExitCode::BadData,
@@ -68,12 +63,11 @@ EditedImage WithCalibration(const EepromImage& image, const std::vector<Assignme
         edited.changes.push_back({assignment.id, before, after});
     }
     const Properties wanted = model.Calibration();
-    const EepromImage dumped = model.Get().Dump();
-    // The dump holds the log as the driver would use it, and nothing in the areas beside the table: of it
-    // only table and calibration are taken.
-    CopyRange(dumped, edited.image, Map::Table,
-              Protocol::LoadBig16(&dumped[Map::Table + Map::TableLayout::Length]));
-    CopyRange(dumped, edited.image, Map::Calibration, wanted.SizeOf(true));
+    // The values keep their sizes and with them their places, which the table must have as the driver does.
+    if (!TableOf(image).Locates(wanted, Map::Calibration, 0)) {
+        RefuseOddTable();
+    }
+    wanted.Dump(edited.image.begin() + Map::Calibration, edited.image.end(), true, true);
     ImageModel proof(edited.image);
     if (!HaveSameBytes(proof.Calibration(), wanted) || !HaveSameBytes(proof.Log(), ImageModel(image).Log())) {
         RefuseOddTable();
@@ -88,7 +82,12 @@ EepromImage WithEmptyLog(const EepromImage& image) {
         RefuseOddTable();  // it would reach into the binary block
     }
     for (const auto& [id, value] : items.GetDatastore()) {
-        model.Get().SetProperty(id, ConfigurationDataConverter::GetDefaultProperty(id));
+        model.Get().GetLog().SetItem(id, ConfigurationDataConverter::GetDefaultProperty(id));
+    }
+    // The model writes both copies where it has them, and with the values' usual sizes.
+    const LogPlaces places = PlacesOf(TableOf(image), model.Log());
+    if (!places.main || !places.second) {
+        RefuseOddTable();
     }
     model.Get().DumpLog();
     const EepromImage edited = model.Contents();

@@ -1,5 +1,6 @@
 #include "Memory/ImageModel.h"
 
+#include <algorithm>
 #include <utility>
 
 #include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
@@ -62,12 +63,25 @@ Properties ImageModel::Table() {
     return LoadSet("EATData");
 }
 
+PellandoEAT TableOf(const EepromImage& image) {
+    return PellandoEAT(image.begin() + EepromMap::Table);
+}
+
+LogPlaces PlacesOf(const PellandoEAT& table, const Properties& items) {
+    const bool hasSecond = std::ranges::all_of(items.GetDatastore(), [&table](const auto& item) {
+        return table.GetDatastore().Contains(
+            static_cast<std::uint16_t>(item.first + EepromMap::LogCopyIdOffset));
+    });
+    return {table.Locates(items, EepromMap::MainLog, 0),
+            !hasSecond || table.Locates(items, EepromMap::LogCopy, EepromMap::LogCopyIdOffset)};
+}
+
 const char* LogCopies::Used() const {
     return main.isValid ? "main copy" : second.isValid ? "second copy" : "an empty log";
 }
 
 LogCopies ReadLogCopies(const EepromImage& image) {
-    const PellandoEAT table(image.begin() + EepromMap::Table);
+    const PellandoEAT table = TableOf(image);
     return {ReadCopy(table, image, 0), ReadCopy(table, image, EepromMap::LogCopyIdOffset)};
 }
 

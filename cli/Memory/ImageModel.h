@@ -35,6 +35,17 @@ class ImageModel final {
     std::unique_ptr<Memory> memory;
 };
 
+/// The allocation table of an image; throws what the memory model throws of one that it cannot use.
+DeviceDriver::Ostra::LowLevel::PellandoEAT TableOf(const EepromImage& image);
+
+/// Whether what the driver writes as the log's two copies is where the table says. A second copy that the
+/// table does not have at all is in nobody's way.
+struct LogPlaces {
+    bool main, second;
+};
+LogPlaces PlacesOf(const DeviceDriver::Ostra::LowLevel::PellandoEAT& table,
+                   const DeviceDriver::Generic::Configuration::Properties& items);
+
 /// The two copies of the usage log, each on its own.
 struct LogCopy {
     bool isReadable = false;  ///< the table says where its values are

@@ -2,10 +2,14 @@
 
 #include <fmt/format.h>
 
+#include <algorithm>
 #include <array>
+#include <cmath>
+#include <limits>
 #include <utility>
+#include <vector>
 
-#include "DeviceDriver/Ostra/LowLevel/PellandoRAM.h"
+#include "Failure.h"
 #include "Protocol/PropertyIdentifiers.h"
 
 namespace Varnholt::Cli {
@@ -13,12 +17,17 @@ namespace {
 
 using DeviceDriver::Generic::Configuration::Properties;
 using DeviceDriver::Generic::Configuration::Property;
+using DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
 using DeviceDriver::Ostra::LowLevel::PellandoRAM;
+using Utilities::Exceptions::ResourceException;
 namespace Ids = Protocol::PropertyIds;
 
 constexpr double Microsecond = 1e-6;
+constexpr double MicrosecondsPerSecond = 1e6;
 constexpr std::uint32_t LongestCount = 65535;
 constexpr double HalfACount = 0.5;
+/// That an instrument could count, if it had the slowest time base.
+constexpr std::uint32_t MostMicroseconds = LongestCount * std::numeric_limits<std::uint8_t>::max();
 
 struct Mode {
     std::uint8_t count = 0;   ///< modes that the instrument has
@@ -27,17 +36,97 @@ struct Mode {
     std::uint8_t coarseFactor = 0;
     std::uint8_t tickMicroseconds = 0;
     std::uint8_t flags = 0;
+
+    /// Microseconds that the model has counted in this mode: from `Shortest` on, and less than `End`.
+    std::uint32_t Shortest() const { return std::uint32_t{coarseFactor} * tickMicroseconds; }
+    std::uint32_t End() const { return LongestCount * tickMicroseconds; }
 };
 
 /// What an instrument without modes counts with.
 constexpr Mode OnlyMode{
     .count = 1, .number = 1, .m3 = 0, .coarseFactor = 130, .tickMicroseconds = 68, .flags = 0};
 
-Mode CurrentMode(Instrument& instrument) {
+Mode CurrentMode(PellandoFunctionality& commands) {
     Mode mode;
-    instrument.Commands().GetMeasureMode(mode.count, mode.number, mode.m3, mode.coarseFactor,
-                                         mode.tickMicroseconds, mode.flags);
+    commands.GetMeasureMode(mode.count, mode.number, mode.m3, mode.coarseFactor, mode.tickMicroseconds,
+                            mode.flags);
     return mode;
+}
+
+/// Goes through the modes as the model does; a mode that does not come when it is called ends the list. The
+/// instrument is left in the last one that was called.
+std::vector<Mode> ListModes(PellandoFunctionality& commands) {
+    std::vector<Mode> modes;
+    for (int number = 1; number <= std::numeric_limits<std::uint8_t>::max(); ++number) {
+        commands.SetMeasureMode(static_cast<std::uint8_t>(number));
+        const Mode mode = CurrentMode(commands);
+        if (mode.number != number) {
+            break;
+        }
+        modes.push_back(mode);
+        if (number >= mode.count) {
+            break;
+        }
+    }
+    return modes;
+}
+
+std::string Describe(const std::vector<Mode>& modes) {
+    std::string text;
+    for (const Mode& mode : modes) {
+        text += fmt::format("{}mode {}: {:.6g} s to {:.6g} s", text.empty() ? "" : "; ", mode.number,
+                            mode.Shortest() * Microsecond, mode.End() * Microsecond);
+    }
+    return text;
+}
+
+/// The lowest float from `seconds` on that the model takes for `microseconds` at least: one or two further.
+float NotBelow(std::uint32_t microseconds, float seconds) {
+    while (PellandoRAM::SearchedMicroseconds(seconds) < microseconds) {
+        seconds = std::nextafter(seconds, std::numeric_limits<float>::infinity());
+    }
+    return seconds;
+}
+
+/// The highest float up to `seconds` that the model takes for less than `microseconds`.
+float Below(std::uint32_t microseconds, float seconds) {
+    while (PellandoRAM::SearchedMicroseconds(seconds) >= microseconds) {
+        seconds = std::nextafter(seconds, 0.0F);
+    }
+    return seconds;
+}
+
+/// A time of 0.000247 s means 247 us, although no float is 0.000247 and the model takes it for 246: where the
+/// float's own rounding is all that keeps it from a whole number, the float that gives that number.
+float AsWholeMicroseconds(float seconds) {
+    const double product = seconds * MicrosecondsPerSecond;
+    const double whole = std::round(product);
+    const double rounding = product * (std::numeric_limits<float>::epsilon() / 2);
+    const bool isMeant = product >= 0 && product <= MostMicroseconds && std::abs(product - whole) <= rounding;
+    return isMeant ? NotBelow(static_cast<std::uint32_t>(whole), seconds) : seconds;
+}
+
+/// A time that the model counts so in the mode with this number; none where no time leads there, as an
+/// earlier mode takes it or the mode itself does not.
+std::optional<float> TimeOf(std::uint16_t count, std::uint8_t modeNumber, const std::vector<Mode>& modes) {
+    std::uint32_t end = MostMicroseconds;
+    for (const Mode& mode : modes) {
+        if (mode.number != modeNumber) {
+            end = std::min(end, mode.Shortest());
+            continue;
+        }
+        end = std::min(end, mode.End());
+        if (mode.Shortest() >= end) {
+            break;
+        }
+        const double tick = mode.tickMicroseconds * Microsecond;
+        const auto exact = static_cast<float>(count * tick);
+        const float lowest = NotBelow(mode.Shortest(), static_cast<float>(mode.Shortest() * Microsecond));
+        const float highest = Below(end, static_cast<float>(end * Microsecond));
+        const float seconds = std::clamp(exact, lowest, highest);
+        return std::lround(seconds / tick) == count ? std::optional(seconds) : std::nullopt;
+    }
+    return std::nullopt;
 }
 
 bool HasModes(const Properties& set) {
@@ -63,69 +152,76 @@ void CheckTimes(const Properties& set, const Mode& mode) {
 }  // namespace
 
 Properties RamAccess::Load() {
-    PellandoRAM ram(instrument.SharedCommands());
+    PellandoRAM ram(commands);
     Properties set("PhysicalConditions");
     ram.Load(set);
+    loaded.reset();
     if (HasModes(set)) {
         std::uint16_t p1 = 0, p2 = 0, p3 = 0;
         std::uint8_t p4 = 0, p5 = 0;
-        instrument.Commands().GetMeasureParameters(p1, p2, p3, p4, p5);
-        const Mode mode = CurrentMode(instrument);
+        commands->GetMeasureParameters(p1, p2, p3, p4, p5);
+        const Mode mode = CurrentMode(*commands);
         const double tick = mode.tickMicroseconds * Microsecond;
-        set.SetProperty(Ids::IntegrationTime, Property(static_cast<float>(p1 * tick)));
+        loaded = {static_cast<float>(p1 * tick), p1, mode.number};
+        set.SetProperty(Ids::IntegrationTime, Property(loaded->seconds));
         set.SetProperty(Ids::SecondTime, Property(static_cast<float>(p2 * mode.coarseFactor * tick)));
     }
     return set;
 }
 
-void RamAccess::Store(Properties& set) {
-    const bool hasModes = HasModes(set);
-    const Mode before = hasModes ? CurrentMode(instrument) : OnlyMode;
-    PellandoRAM ram(instrument.SharedCommands());
+void RamAccess::SwitchMode(PellandoRAM& ram, Properties& set, std::uint8_t currentMode) {
+    const float wanted = set.GetProperty(Ids::IntegrationTime).AsFloat();
+    const bool isAsLoaded = loaded && loaded->seconds == wanted && loaded->mode == currentMode;
+    set.SetProperty(Ids::IntegrationTime, Property(AsWholeMicroseconds(wanted)));
     try {
         ram.SwitchToPerfectMode(set);
-        CheckTimes(set, hasModes ? CurrentMode(instrument) : OnlyMode);
-    } catch (const Utilities::Exceptions::ResourceException& exception) {
-        const std::string modes = DescribeModes();
-        instrument.Commands().SetMeasureMode(before.number);
+        if (!isAsLoaded || CurrentMode(*commands).number == currentMode) {
+            return;
+        }
+    } catch (const ResourceException&) {
+        if (!isAsLoaded) {
+            throw;
+        }
+    }
+    // The count was made of another time, which the mode's neighbours do not take.
+    if (const auto time = TimeOf(loaded->count, currentMode, ListModes(*commands))) {
+        set.SetProperty(Ids::IntegrationTime, Property(*time));
+    }
+    ram.SwitchToPerfectMode(set);
+}
+
+void RamAccess::Store(const Properties& set) {
+    const bool hasModes = HasModes(set);
+    const Mode before = hasModes ? CurrentMode(*commands) : OnlyMode;
+    PellandoRAM ram(commands);
+    Properties sent = set;
+    try {
+        if (hasModes) {
+            SwitchMode(ram, sent, before.number);
+        }
+        CheckTimes(sent, hasModes ? CurrentMode(*commands) : OnlyMode);
+    } catch (const ResourceException& exception) {
+        const std::string modes = Describe(ListModes(*commands));
+        commands->SetMeasureMode(before.number);
         throw ToolFailure(ExitCode::BadData,
                           fmt::format("{}: {} s fits none of the instrument's modes", exception.what(),
                                       set.GetProperty(Ids::IntegrationTime).AsFloat()),
                           modes);
     } catch (const ToolFailure&) {
         if (hasModes) {
-            instrument.Commands().SetMeasureMode(before.number);
+            commands->SetMeasureMode(before.number);
         }
         throw;
     }
-    ram.Store(set);
+    ram.Store(sent);
 }
 
 double RamAccess::TimeUnit() {
     std::uint8_t m1 = 0, m3 = 0;
     std::uint16_t m2 = 0, m4 = 0, m5 = 0;
-    instrument.Commands().GetMISC(m1, m2, m3, m4, m5);
-    const Mode mode = m2 >= Ids::FirstMisc2WithModes ? CurrentMode(instrument) : OnlyMode;
+    commands->GetMISC(m1, m2, m3, m4, m5);
+    const Mode mode = m2 >= Ids::FirstMisc2WithModes ? CurrentMode(*commands) : OnlyMode;
     return mode.tickMicroseconds * Microsecond;
-}
-
-/// Goes through the modes as the model does; a mode that does not come when it is called ends the list.
-std::string RamAccess::DescribeModes() {
-    std::string text;
-    for (int number = 1; number <= 255; ++number) {
-        instrument.Commands().SetMeasureMode(static_cast<std::uint8_t>(number));
-        const Mode mode = CurrentMode(instrument);
-        if (mode.number != number) {
-            break;
-        }
-        const double tick = mode.tickMicroseconds * Microsecond;
-        text += fmt::format("{}mode {}: {:.6g} s to {:.6g} s", text.empty() ? "" : "; ", number,
-                            mode.coarseFactor * tick, LongestCount * tick);
-        if (number >= mode.count) {
-            break;
-        }
-    }
-    return text;
 }
 
 }  // namespace Varnholt::Cli

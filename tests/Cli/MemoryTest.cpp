@@ -134,7 +134,19 @@ TEST(ImageEditTest, RefusesWhatItCannotProve) {
     std::copy_n(image.begin() + Map::Calibration, Map::CalibrationSize,
                 moved.begin() + Map::Calibration + 1000);
     ASSERT_EQ(ImageModel(moved).Get().GetProperty(1211).AsLong(), 77);
-    EXPECT_THROW(WithCalibration(moved, {{1211, "5"}}), DeviceDriver::Generic::Utilities::DataException);
+    FailureOf([&] { WithCalibration(moved, {{1211, "5"}}); }, ExitCode::BadData);
+    // The same of the log, which is empty here and there, so that nobody would notice.
+    for (const std::uint32_t copy : {0U, 2048U}) {
+        EepromImage elsewhere = image;
+        for (std::uint32_t at = Map::Table + 4; at + 6 <= Map::Table + 334; at += 6) {
+            const std::uint32_t address = Protocol::LoadBig32(&elsewhere[at + 2]);
+            if (address >= copy && address < copy + 2048) {
+                Protocol::StoreBig32(&elsewhere[at + 2], address + 5000 - copy);
+            }
+        }
+        std::fill_n(elsewhere.begin() + 5000, 1064, 0);
+        FailureOf([&] { WithEmptyLog(elsewhere); }, ExitCode::BadData);
+    }
     EepromImage corrupt = image;
     corrupt[Map::Table + 1] = 2;
     EXPECT_THROW(WithCalibration(corrupt, {{1211, "5"}}), DeviceDriver::Generic::Utilities::DataException);
@@ -240,6 +252,18 @@ TEST(ImageCheckTest, FindsWhatIsWrong) {
                   "warning table: the calibration lacks 1001", true},
              Case{"no checksum", [](EepromImage& image) { SetEntry(image, 0, 1999, 0); },
                   "error table: the driver refuses the image: id 10000 doesn't exist", false},
+             Case{"log elsewhere", [](EepromImage& image) { SetEntry(image, 11, 10021, 1061); },
+                  "error log: the table has it elsewhere than the driver writes it", false},
+             Case{"second log elsewhere", [](EepromImage& image) { SetEntry(image, 25, 3, 3116); },
+                  "warning log: the table has the second copy elsewhere than the driver writes it", true},
+             Case{"longer log",
+                  [](EepromImage& image) {
+                      SetEntry(image, 12, 1, 1068);
+                      std::fill_n(image.begin() + 1064, 4, std::uint8_t{0});
+                  },
+                  "warning log: it reaches into the binary block", true},
+             Case{"calibration elsewhere", [](EepromImage& image) { SetEntry(image, 26, 1000, 4604); },
+                  "warning table: calibration values cannot be changed", true},
              Case{"repeated", [](EepromImage& image) { SetEntry(image, 28, 1001, 4616); },
                   "warning table: 1 entries repeat an identifier", true},
              Case{"no number", [](EepromImage& image) { std::fill_n(image.begin() + 4608, 4, 0xFF); },

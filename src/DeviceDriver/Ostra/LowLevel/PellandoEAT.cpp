@@ -24,6 +24,7 @@ using namespace Generic::Configuration;
 using Generic::Utilities::DataException;
 using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Exceptions::ResourceException;
+using Varnholt::Utilities::Exceptions::SourceLocation;
 using Varnholt::Utilities::Tools::lexical_cast;
 
 namespace {
@@ -39,11 +40,11 @@ std::uint16_t WithOffset(std::uint16_t id, std::uint16_t idOffset) {
     return static_cast<std::uint16_t>(id + idOffset);
 }
 
-/// The distance between two addresses, which may be any two 32-bit numbers.
-std::int32_t To32Bits(std::int64_t value) {
+/// The distance between two addresses, which may be any two 32-bit numbers. A refusal is the caller's.
+std::int32_t To32Bits(std::int64_t value, const SourceLocation& caller = SourceLocation::current()) {
     if (value < std::numeric_limits<std::int32_t>::min() ||
         value > std::numeric_limits<std::int32_t>::max()) {
-        throw DataException(PellandoEAT::CorruptTable, Here());
+        throw DataException(PellandoEAT::CorruptTable, Here(caller));
     }
     return static_cast<std::int32_t>(value);
 }
@@ -94,25 +95,26 @@ void PellandoEAT::ParseBuffer(const std::uint8_t* buffer) try {
         newLength > TableLayout::LongestLength) {
         throw DataException(CorruptTable, Here());
     }
-    Properties parsed;
+    version = newVersion;
+    length = newLength;
     std::bitset<std::numeric_limits<std::uint16_t>::max() + 1> seen;
+    for (const auto& entry : datastore.GetDatastore()) {
+        seen.set(entry.first);
+    }
     for (std::uint32_t offset = HeaderSize;
-         offset < newLength && offset + TableLayout::EntrySize <= EepromMap::TableArea;
+         offset < length && offset + TableLayout::EntrySize <= EepromMap::TableArea;
          offset += TableLayout::EntrySize) {
         std::uint16_t id = 0;
         std::int32_t address = 0;
         EndianConversion::ByteArrayToShort(buffer + offset + TableLayout::EntryIdentifier, id, true);
         EndianConversion::ByteArrayToLong(buffer + offset + TableLayout::EntryAddress, address, true);
         if (seen[id]) {
-            parsed.SetProperty(id, Property(address));
+            datastore.SetProperty(id, Property(address));
         } else {
-            parsed.GetDatastore().emplace_back(id, Property(address));
+            datastore.GetDatastore().emplace_back(id, Property(address));
             seen.set(id);
         }
     }
-    version = newVersion;
-    length = newLength;
-    std::swap(datastore, parsed);
 }
 TRACED
 
@@ -130,8 +132,7 @@ std::int32_t PellandoEAT::SizeOf(std::uint16_t id) const try {
 TRACED
 
 bool PellandoEAT::IsEntryInLogArea(std::uint16_t id, std::uint32_t count) const try {
-    const std::int64_t address = AddressOf(id);
-    return address >= 0 && address + count < EepromMap::EndOfLogArea;
+    return std::int64_t{AddressOf(id)} + count < EepromMap::EndOfLogArea;
 }
 TRACED
 
@@ -201,12 +202,6 @@ void PellandoEAT::MoveTo(std::uint16_t id, std::int64_t address, Backup& before)
         before = datastore;
     }
     datastore.GetProperty(id).Assign(To32Bits(address));
-}
-
-bool PellandoEAT::Holds(const Properties& set, std::uint16_t idOffset) const {
-    return std::ranges::all_of(set.GetDatastore(), [&](const auto& value) {
-        return datastore.Contains(WithOffset(value.first, idOffset));
-    });
 }
 
 bool PellandoEAT::Locates(const Properties& set, std::uint32_t start, std::uint16_t idOffset) const try {

@@ -29,10 +29,13 @@ class PellandoEAT final {
     PellandoEAT(const PellandoEAT&) = delete;
     PellandoEAT& operator=(const PellandoEAT&) = delete;
 
-    /// Replaces the table by the one in the 512 bytes at `buffer`. A version other than 1 or a length outside
-    /// 300 to 512 is refused with `DataException` "corrupt EAT detected!!" and changes nothing. Entries are
-    /// read while they begin before the length; one that is not wholly in the 512 bytes is none. An
-    /// identifier that is repeated keeps its first place and gets its last address.
+    /// Adds the table in the 512 bytes at `buffer` to what this one holds, and takes its version and length.
+    /// A version other than 1 or a length outside 300 to 512 is refused with `DataException` "corrupt EAT
+    /// detected!!" and changes nothing. Entries are read while they begin before the length. An identifier
+    /// that is there already, or is repeated, keeps its first place and gets its last address.
+    ///
+    /// The last entry of a length from 509 on would end behind the table's 512 bytes, in the calibration
+    /// data: it is left out.
     void ParseBuffer(const std::uint8_t* buffer);
 
     /// Both refuse an unknown identifier with `ResourceException` "id N doesn't exist". `SizeOf` also refuses
@@ -41,7 +44,8 @@ class PellandoEAT final {
     std::int32_t AddressOf(std::uint16_t id) const;
     std::int32_t SizeOf(std::uint16_t id) const;
 
-    /// Whether `count` bytes from the entry's address end before address 4096.
+    /// Whether the entry's address plus `count` is less than 4096; the sum alone decides, whatever the
+    /// address.
     bool IsEntryInLogArea(std::uint16_t id, std::uint32_t count) const;
 
     /// Makes room for values whose size has changed: behind each such value the set's later identifiers move
@@ -55,10 +59,9 @@ class PellandoEAT final {
     /// would be read back with a wrong size. A failure restores the table.
     void FitSection(const Properties& set, std::uint16_t idOffset);
 
-    /// Whether the table has every identifier of `set`, plus `idOffset`.
-    bool Holds(const Properties& set, std::uint16_t idOffset) const;
     /// Whether the table finds the values of `set`, under their identifiers plus `idOffset`, where they lie
-    /// when they are dumped one behind the other from `start` on.
+    /// when they are dumped one behind the other from `start` on. Nothing here insists on it: it is for those
+    /// who check an image before they write it.
     bool Locates(const Properties& set, std::uint32_t start, std::uint16_t idOffset) const;
 
     /// Writes header and entries from `first` on. A range that is too short is refused with

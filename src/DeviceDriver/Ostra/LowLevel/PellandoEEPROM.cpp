@@ -5,7 +5,6 @@
 #include <exception>
 #include <utility>
 
-#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
 #include "DeviceDriver/Ostra/LowLevel/SectionReader.h"
 #include "Protocol/EepromMap.h"
@@ -18,9 +17,9 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace EepromMap = Protocol::EepromMap;
 namespace PropertyIds = Protocol::PropertyIds;
 using namespace Generic::Configuration;
-using Generic::Utilities::DataException;
 using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Exceptions::ResourceException;
+using Varnholt::Utilities::Exceptions::RuntimeException;
 using Varnholt::Utilities::Tools::lexical_cast;
 using Varnholt::Utilities::Tools::SmartPointer;
 using Bytes = std::vector<std::uint8_t>;
@@ -56,11 +55,12 @@ Bytes Joined(Bytes first, const Bytes& second) {
     return first;
 }
 
-/// Whether the table finds both copies of the log where they are dumped.
-bool LocatesLog(const PellandoEAT& table, const Properties& items) {
-    return table.Locates(items, EepromMap::MainLog, 0) &&
-           (!table.Holds(items, EepromMap::LogCopyIdOffset) ||
-            table.Locates(items, EepromMap::LogCopy, EepromMap::LogCopyIdOffset));
+/// The main copy does without the second: where the table lacks it, or holds nonsense of it, it stays so.
+void FitSecondLog(PellandoEAT& table, const Properties& items) {
+    try {
+        table.FitSection(items, EepromMap::LogCopyIdOffset);
+    } catch (const RuntimeException&) {
+    }
 }
 
 bool IsRequested(const Properties& set, std::uint16_t request) {
@@ -75,8 +75,8 @@ PellandoEEPROM::PellandoEEPROM(const SmartPointer<PellandoFunctionality>& instru
     const Bytes second = Read(*functionality, HalfSize, HalfSize);
     const Bytes image = Joined(std::move(first), second);
     eat = SmartPointer<PellandoEAT>(new PellandoEAT(image.begin() + EepromMap::Table));
-    storedTable = SmartPointer<PellandoEAT>(new PellandoEAT(image.begin() + EepromMap::Table));
     log = SmartPointer<PellandoLog>(new PellandoLog(*eat, image.begin()));
+    logArea = std::clamp<std::size_t>(log->SizeOf(), EepromMap::LogSize, EepromMap::LogArea);
     SetupCalibrationData(image);
 }
 TRACED
@@ -235,12 +235,7 @@ Bytes PellandoEEPROM::Dump() try {
     eat->EnsureConsistency(currentLog);
     const Properties& items = currentLog.GetItems();
     eat->FitSection(items, 0);
-    if (eat->Holds(items, EepromMap::LogCopyIdOffset)) {
-        eat->FitSection(items, EepromMap::LogCopyIdOffset);
-    }
-    if (!LocatesLog(*eat, items) || !eat->Locates(calibration, EepromMap::Calibration, 0)) {
-        throw DataException(PellandoEAT::CorruptTable, Here());
-    }
+    FitSecondLog(*eat, items);
     Bytes image(Protocol::EepromSize, UnusedByte);
     const auto at = [&image](std::ptrdiff_t address) { return image.begin() + address; };
     GetLog(true).Dump(at(EepromMap::MainLog), at(EepromMap::LogCopy));
@@ -282,12 +277,11 @@ TRACED
 
 void PellandoEEPROM::DumpLog() try {
     log->UpdateChecksum();  // which decides the checksum item's size
-    Bytes bytes(std::min<std::size_t>(log->SizeOf(), EepromMap::LogArea));
-    log->Dump(bytes.begin(), bytes.end());
-    if (!LocatesLog(*storedTable, log->GetItems())) {
-        // The values would be read back as others, and what lies behind the log would be overwritten.
-        throw DataException(PellandoEAT::CorruptTable, Here());
+    if (log->SizeOf() > logArea) {
+        throw ResourceException("Configuration data dump target too small", Here());
     }
+    Bytes bytes(log->SizeOf());
+    log->Dump(bytes.begin(), bytes.end());
     functionality->WriteEEPROM(EepromMap::MainLog, bytes);
     functionality->WriteEEPROM(EepromMap::LogCopy, bytes);
 }

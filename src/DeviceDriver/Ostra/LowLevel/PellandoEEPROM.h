@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <string>
@@ -16,6 +17,9 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 /// identifier. Calibration values change in memory only, until a caller writes an image made by `Dump` to the
 /// instrument; the log is written, twice, by `DumpLog` and whatever leads to it. The binary block and the raw
 /// words are read and written directly.
+///
+/// An object whose image was written to its instrument must be made anew: it knows the instrument's EEPROM as
+/// it was read, and its end would write the log as that stood.
 ///
 /// A refusal is `ResourceException`; failures of transfers pass through. One thread at a time.
 class PellandoEEPROM {
@@ -44,7 +48,8 @@ class PellandoEEPROM {
     /// identifier is; others are left alone.
     virtual Properties& Load(Properties& set);
     /// Sets each log and calibration value of the set. Then, if 20002 is 1, dumps the log; otherwise, if
-    /// 20001 is 1, sets it to 0 and writes through, which dumps the log as well.
+    /// 20001 is 1, sets it to 0 and writes through, which dumps the log as well. A write-through that fails
+    /// passes on what failed, and leaves the object locked: it must not stay open to other writes.
     virtual void Store(Properties& set);
     /// 10100: exactly 1904 bytes, "Wrong Tallimer size" otherwise, written in two parts. 10200 to 10215: the
     /// data from the word's address on; data that would end beyond address 4095, and the words from 10216 on,
@@ -53,12 +58,13 @@ class PellandoEEPROM {
     /// 10100: 1904 bytes. 10200 to 10239: 4 bytes. Any other identifier: none.
     virtual std::vector<std::uint8_t> LoadBinary(std::uint16_t id);
     /// The image of the current contents, 8192 bytes; unused bytes, the binary block and the raw words are
-    /// 0xFF. Values that have changed their size are moved to make room. The instrument is not written to,
-    /// except for a log whose dump is due.
+    /// 0xFF. Behind a value that has changed its size the later ones move, and with them the section's end,
+    /// which gives the last value its size; the entries of the second log move as those of the main one. The
+    /// instrument is not written to, except for a log whose dump is due.
     ///
-    /// The image can be read back: a table that would not find the values where the image holds them is
-    /// refused with `DataException` "corrupt EAT detected!!", values that have outgrown their area with
-    /// `ResourceException`.
+    /// The values lie one behind the other from their areas' beginnings on. Whether the table says so is for
+    /// the caller to check before such an image is written anywhere. Values that have outgrown their area in
+    /// the image, and values that the table lacks, are refused with `ResourceException`.
     virtual std::vector<std::uint8_t> Dump();
 
     const Property& GetProperty(std::uint16_t id);
@@ -71,9 +77,12 @@ class PellandoEEPROM {
     void Unlock();
     void ThrowIfLocked() const;
     void WriteThrough();
-    /// Writes the log to both its places, the main copy first. After a failure in the first write the second
-    /// copy is the old one. A log that would reach beyond its area (`ResourceException`) or that does not
-    /// lie there as the instrument's table says (`DataException`) is refused before anything is written.
+    /// Writes the log to both its places, at 0 and at 2048, the main copy first. After a failure in the first
+    /// write the second copy is the old one.
+    ///
+    /// One thing is refused, with `ResourceException` and before anything is written or forgotten: a log that
+    /// has grown beyond the 1064 bytes of its area (or the size it was read with, where that is more, up to
+    /// 2048), as it would overwrite what lies behind it. It can be made smaller through `GetLog`.
     void DumpLog();
 
     /// Reads the calibration values out of an image of 8192 bytes.
@@ -92,8 +101,7 @@ class PellandoEEPROM {
     bool locked = true;
     Varnholt::Utilities::Tools::SmartPointer<PellandoLog> log;
     Varnholt::Utilities::Tools::SmartPointer<PellandoEAT> eat;
-    /// As the instrument has it, whatever `Dump` makes of the other: what is written must fit this one.
-    Varnholt::Utilities::Tools::SmartPointer<PellandoEAT> storedTable;
+    std::size_t logArea = 0;  ///< bytes that the log may take in the instrument
     Properties calibration;
     LostLogHandler reportLostLog;
 };

@@ -21,7 +21,7 @@ namespace {
 
 constexpr float InitialTickSeconds = 6.8e-5F;
 constexpr std::uint16_t InitialCoarseFactor = 130;
-constexpr std::uint32_t MicrosecondsPerSecond = 1000000;
+constexpr double MicrosecondsPerSecond = 1e6;
 constexpr std::uint32_t LongestCount = 65535;
 constexpr std::int32_t LargestThirdParameter = 256;
 /// A mode is a byte that starts at 1.
@@ -49,15 +49,6 @@ Integer Truncated(double value) {
         return std::numeric_limits<Integer>::min();
     }
     return static_cast<Integer>(value);
-}
-
-/// A whole number of microseconds where the float's own rounding is all that keeps it from one: a time of
-/// 0.00884 s means 8840 of them, although no float is 0.00884.
-double Microseconds(float seconds) {
-    const double product = double{seconds} * MicrosecondsPerSecond;
-    const double whole = std::round(product);
-    const double rounding = std::abs(product) * (std::numeric_limits<float>::epsilon() / 2);
-    return std::abs(product - whole) <= rounding ? whole : product;
 }
 
 /// Rounds to the nearest count and keeps the 16 bits that the instrument takes.
@@ -194,6 +185,12 @@ void PellandoRAM::StoreMeasureParameters(Properties& set) try {
 }
 TRACED
 
+std::uint32_t PellandoRAM::SearchedMicroseconds(float seconds) {
+    // The double holds the product of two floats exactly; it is rounded once, to a float.
+    const auto product = static_cast<float>(seconds * MicrosecondsPerSecond);
+    return static_cast<std::uint32_t>(Truncated<std::int64_t>(product));
+}
+
 void PellandoRAM::SwitchToPerfectMode(const Properties& set) try {
     tickSeconds = InitialTickSeconds;
     coarseFactor = InitialCoarseFactor;
@@ -201,8 +198,7 @@ void PellandoRAM::SwitchToPerfectMode(const Properties& set) try {
         perfectMode = false;
         return;
     }
-    const double wanted = Microseconds(set.GetProperty(IntegrationTime).AsFloat());
-    const auto microseconds = static_cast<std::uint32_t>(Truncated<std::int64_t>(wanted));
+    const std::uint32_t microseconds = SearchedMicroseconds(set.GetProperty(IntegrationTime).AsFloat());
     std::uint8_t mode = 0;
     for (int round = 0; round < MostModes; ++round) {
         mode = static_cast<std::uint8_t>(mode + 1);
@@ -214,7 +210,7 @@ void PellandoRAM::SwitchToPerfectMode(const Properties& set) try {
         }
         if (std::uint32_t{factor} * unitMicroseconds <= microseconds) {
             perfectMode = (modeFlags & 1U) != 0;
-            tickSeconds = static_cast<float>(unitMicroseconds / double{MicrosecondsPerSecond});
+            tickSeconds = static_cast<float>(unitMicroseconds / MicrosecondsPerSecond);
             coarseFactor = factor;
             return;
         }

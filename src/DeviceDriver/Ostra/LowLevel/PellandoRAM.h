@@ -42,11 +42,16 @@ class PellandoRAM {
     void LoadMeasureParameters(Properties& set);
     void StoreMeasureParameters(Properties& set);
     /// Picks the first of the instrument's modes whose time base can count the integration time 2009, and
-    /// switches to it. An instrument whose 2013 is below 301 has one mode only. Fails with
-    /// `ResourceException` "Integration time too high" or "Integration time too low", the instrument left in
-    /// the last mode tried and the time base of construction in force; an instrument that never comes to its
-    /// last mode counts as "too low" after 255 tries.
+    /// switches to it: one with factor times unit <= time < 65535 times unit. An instrument whose 2013 is
+    /// below 301 has one mode only. Fails with `ResourceException` "Integration time too high" or
+    /// "Integration time too low", the instrument left in the last mode tried and the time base of
+    /// construction in force; an instrument that never comes to its last mode counts as "too low" after 255
+    /// tries.
     void SwitchToPerfectMode(const Properties& set);
+    /// The time as the search compares it with the modes: the product of two floats, as a float, without its
+    /// fraction. A whole number of microseconds may come out one less, as 0.000247 s do, which no float is:
+    /// who needs the number exact hands down the float above.
+    static std::uint32_t SearchedMicroseconds(float seconds);
 
     /// The template of a whole set, every element -1.
     static const Properties& GetDefaultPhysicalConditons();

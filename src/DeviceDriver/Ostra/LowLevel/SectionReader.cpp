@@ -18,14 +18,10 @@ using Varnholt::Utilities::Exceptions::Here;
 
 namespace {
 
-/// The image's bytes of one value, or `DataException`: the table came from outside.
-std::span<const std::uint8_t> BytesOf(const std::uint8_t* image, std::int32_t address, std::int32_t size) {
+/// The table came from outside.
+bool LiesInTheImage(std::int32_t address, std::int32_t size) {
     constexpr auto end = static_cast<std::int32_t>(Protocol::EepromSize);
-    if (address < 0 || address > end || size < 0 || size > end - address ||
-        size % static_cast<std::int32_t>(Property::ElementSize) != 0) {
-        throw DataException(PellandoEAT::CorruptTable, Here());
-    }
-    return {image + address, static_cast<std::size_t>(size)};
+    return address >= 0 && address <= end && size >= 0 && size <= end - address;
 }
 
 }  // namespace
@@ -38,9 +34,13 @@ Properties SectionReader::operator()(const std::uint8_t* image, std::uint16_t id
             continue;
         }
         const auto tableId = static_cast<std::uint16_t>(id + idOffset);
-        const auto bytes = BytesOf(image, table.AddressOf(tableId), table.SizeOf(tableId));
+        const std::int32_t address = table.AddressOf(tableId);
+        const std::int32_t size = table.SizeOf(tableId);
+        if (!LiesInTheImage(address, size)) {
+            throw DataException(PellandoEAT::CorruptTable, Here());
+        }
         Property value = ConfigurationDataConverter::GetDefaultProperty(id);
-        value.Assign(bytes, true);
+        value.Assign(std::span(image + address, static_cast<std::size_t>(size)), true);
         // No identifier occurs twice in a table, so there is nothing to look for in the section.
         section.GetDatastore().emplace_back(id, std::move(value));
     }

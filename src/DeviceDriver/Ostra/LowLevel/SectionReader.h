@@ -22,9 +22,10 @@ class SectionReader final {
     /// identifier plus `idOffset` and filed under its identifier. The table says how many bytes that is,
     /// which may be more or less than the identifier's default has; an empty value is possible.
     ///
-    /// An address outside the image, a size that is negative or no multiple of 4, or a value that ends
-    /// outside the image is refused with `DataException` "corrupt EAT detected!!"; an identifier that the
-    /// table lacks or has as its last entry with `ResourceException` "id N doesn't exist".
+    /// Of a size that is no multiple of 4 the bytes behind the last whole element are ignored. An address
+    /// outside the image, a negative size, or a value that ends outside the image is refused with
+    /// `DataException` "corrupt EAT detected!!"; an identifier that the table lacks or has as its last entry
+    /// with `ResourceException` "id N doesn't exist".
     Generic::Configuration::Properties operator()(const std::uint8_t* image, std::uint16_t idOffset) const;
 
   private:

@@ -66,17 +66,11 @@ Values ValuesIn(const Bytes& image) {
     return ValuesOf(eeprom);
 }
 
-/// Whether an image must have a readable second copy of the log: its table has every entry of it.
-bool HasSecondLog(PellandoEEPROM& eeprom) {
-    Properties table("EATData"), log("LogData");
-    eeprom.Load(table);
-    eeprom.Load(log);
-    for (const auto& entry : log.GetDatastore()) {
-        if (!table.Contains(static_cast<std::uint16_t>(entry.first + EepromMap::LogCopyIdOffset))) {
-            return false;
-        }
-    }
-    return true;
+/// Whether the image's table finds the model's values of a section from `start` on.
+bool Locates(const Bytes& image, PellandoEEPROM& eeprom, const char* section, std::uint32_t start,
+             std::uint16_t idOffset = 0) {
+    Properties values(section);
+    return PellandoEAT(image.begin() + EepromMap::Table).Locates(eeprom.Load(values), start, idOffset);
 }
 
 Property Resized(Property value, std::uint16_t elements) {
@@ -102,11 +96,15 @@ ImageOutcome CheckImage(const Bytes& image, const std::vector<Resize>& resizes) 
         })) {
         return ImageOutcome::DumpRefused;
     }
+    if (!Locates(dumped, *eeprom, "LogData", EepromMap::MainLog) ||
+        !Locates(dumped, *eeprom, "CalibrationData", EepromMap::Calibration)) {
+        return ImageOutcome::Misplaced;
+    }
     const Values expected = ValuesOf(*eeprom);  // behind the dump, which renews the checksum
     if (ValuesIn(dumped) != expected) {
         throw std::logic_error("the dump reads differently");
     }
-    if (HasSecondLog(*eeprom)) {
+    if (Locates(dumped, *eeprom, "LogData", EepromMap::LogCopy, EepromMap::LogCopyIdOffset)) {
         dumped[EepromMap::MainLog] = static_cast<std::uint8_t>(~dumped[EepromMap::MainLog]);
         if (ValuesIn(dumped) != expected) {
             throw std::logic_error("the dump's second log reads differently");

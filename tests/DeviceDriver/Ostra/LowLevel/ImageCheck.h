@@ -10,6 +10,7 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 enum class ImageOutcome {
     Refused,        ///< cannot be loaded, with a documented exception
     DumpRefused,    ///< was loaded and read; changing or dumping it is refused, with a documented exception
+    Misplaced,      ///< was dumped, but its table has values elsewhere than a dump puts them
     RoundTripRight  ///< the dump was loaded again and holds the same values, in both copies of the log
 };
 

@@ -41,8 +41,8 @@ Bytes MutatedImage(const Bytes& fresh, std::uint32_t seed) {
 
 /// How often each outcome came about; ends with the first failure.
 template <class Check>
-std::array<int, 3> Outcomes(std::uint32_t count, Check check) {
-    std::array<int, 3> outcomes{};
+std::array<int, 4> Outcomes(std::uint32_t count, Check check) {
+    std::array<int, 4> outcomes{};
     for (std::uint32_t seed = 0; seed < count; ++seed) {
         try {
             ++outcomes[static_cast<std::size_t>(check(seed))];
@@ -61,9 +61,10 @@ TEST(MutatedImages, GiveAModelThatRoundTripsOrADocumentedException) {
     const auto outcomes =
         Outcomes(count, [&](std::uint32_t seed) { return CheckImage(MutatedImage(fresh, seed)); });
     std::cout << count << " images: " << outcomes[0] << " refused, " << outcomes[1]
-              << " loaded but not to be dumped, " << outcomes[2] << " round trips\n";
-    for (const int outcome : outcomes) {
-        EXPECT_GT(outcome, static_cast<int>(count / 100)) << "the images must reach every outcome";
+              << " loaded but not to be dumped, " << outcomes[2]
+              << " dumped elsewhere than their tables say, " << outcomes[3] << " round trips\n";
+    for (const std::size_t outcome : {0U, 2U, 3U}) {
+        EXPECT_GT(outcomes[outcome], static_cast<int>(count / 100)) << "the images must reach every outcome";
     }
 }
 
@@ -83,7 +84,7 @@ TEST(MutatedImages, ValuesOfAnySizeRoundTripOrAreRefused) {
     });
     EXPECT_EQ(outcomes[0], 0) << "a fresh image can be loaded";
     EXPECT_GT(outcomes[1], 0);
-    EXPECT_GT(outcomes[2], outcomes[1]);
+    EXPECT_GT(outcomes[3], outcomes[1]);
 }
 
 }  // namespace

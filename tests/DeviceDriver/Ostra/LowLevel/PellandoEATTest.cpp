@@ -22,6 +22,7 @@ using namespace Generic::Configuration;
 using Generic::Utilities::DataException;
 using Tests::ExpectThrow;
 using Varnholt::Utilities::Exceptions::ResourceException;
+using Varnholt::Utilities::Exceptions::TraceableException;
 using Entries = std::vector<std::pair<std::uint16_t, std::int32_t>>;
 using Longs = std::vector<std::int32_t>;
 
@@ -86,6 +87,9 @@ TEST_F(FreshTable, SizeIsTheDistanceToTheNextEntry) {
     EXPECT_TRUE(table.IsEntryInLogArea(11021, 4095 - 3108));
     EXPECT_FALSE(table.IsEntryInLogArea(11021, 4096 - 3108));
     EXPECT_FALSE(table.IsEntryInLogArea(10000, 0xFFFFFFFF));
+    table.GetDatastore().GetProperty(10000).Assign(std::int32_t{-8});
+    EXPECT_TRUE(table.IsEntryInLogArea(10000, 4103)) << "the sum alone decides";
+    EXPECT_FALSE(table.IsEntryInLogArea(10000, 4104));
 }
 
 TEST(PellandoEAT, HeaderDecidesWhetherAndHowFarTheTableIsRead) {
@@ -104,15 +108,19 @@ TEST(PellandoEAT, HeaderDecidesWhetherAndHowFarTheTableIsRead) {
         SCOPED_TRACE(testing::Message() << "version " << row.version << ", length " << row.length);
         const Bytes bytes = TableBytes(row.version, row.length, many);
         PellandoEAT table;
-        table.InitializeEmtpyEAT();
+        table.CreateSection({}, 77, 100, 0);
+        table.CreateSection({}, 88, 5, 0);
         if (row.entries == 0) {
             ExpectThrow<DataException>(Corrupt, [&] { table.ParseBuffer(bytes.data()); });
             ExpectThrow<DataException>(Corrupt, [&] { PellandoEAT{bytes.begin()}; });
-            EXPECT_EQ(EntriesOf(table), Fresh);
+            EXPECT_EQ(EntriesOf(table), (Entries{{100, 77}, {5, 88}}));
         } else {
+            // What the table holds keeps its place; 100, the first of the entries, gets its address.
+            Entries expected{{100, 0}, {5, 88}};
+            expected.insert(expected.end(), many.begin() + 1,
+                            many.begin() + static_cast<std::ptrdiff_t>(row.entries));
             table.ParseBuffer(bytes.data());
-            EXPECT_EQ(EntriesOf(table),
-                      Entries(many.begin(), many.begin() + static_cast<std::ptrdiff_t>(row.entries)));
+            EXPECT_EQ(EntriesOf(table), expected);
         }
     }
 }
@@ -243,8 +251,9 @@ TEST(SectionReader, FollowsTheTableWhereItCanBeUsedAndRefusesItWhereNot) {
              Case{"behind the image", 8193, 8197, refused},
              Case{"before the image", -4, 0, refused},
              Case{"backwards", 4744, 4740, refused},
-             Case{"no whole element", 4740, 4743, refused},
-             Case{"half an element too many", 4740, 4746, refused},
+             Case{"no whole element", 4740, 4743, 0},
+             Case{"half an element too many", 4740, 4746, 1},
+             Case{"half an element too many, at the end", 8182, 8192, 2},
              Case{"far behind", highest, highest, refused},
              Case{"far before", lowest, lowest, refused},
              Case{"farthest apart", lowest, highest, refused},
@@ -258,7 +267,16 @@ TEST(SectionReader, FollowsTheTableWhereItCanBeUsedAndRefusesItWhereNot) {
         const Bytes image = FreshImage();
         const SectionReader read(table, &ConfigurationDataConverter::IsCalibrationParameter);
         if (row.elements == refused) {
-            ExpectThrow<DataException>(Corrupt, [&] { read(image.data(), 0); });
+            ExpectThrow<DataException>(Corrupt, [&] {
+                try {
+                    read(image.data(), 0);
+                } catch (const TraceableException& exception) {
+                    EXPECT_THAT(
+                        exception.GetTrace().front(),
+                        testing::ContainsRegex("LowLevel::(SectionReader::operator|PellandoEAT::SizeOf)"));
+                    throw;
+                }
+            });
         } else {
             const Properties section = read(image.data(), 0);
             EXPECT_EQ(section.GetProperty(3010).AsLongVector().size(), row.elements);

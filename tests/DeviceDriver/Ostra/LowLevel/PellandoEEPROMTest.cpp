@@ -274,23 +274,32 @@ TEST(EepromImages, ValuesThatChangedTheirSizeReadBackRight) {
     }
 }
 
-TEST_F(EepromTest, DumpRefusesWhatCannotBeReadBack) {
+TEST_F(EepromTest, DumpRefusesOnlyWhatDoesNotFitTheImage) {
     Load();
     eeprom->SetProperty(3013, Property(Longs(861, 9)));
     ExpectThrow<ResourceException>("Configuration data dump target too small", [&] { eeprom->Dump(); });
     eeprom->SetProperty(3013, Long(9));
     EXPECT_EQ(Protocol::LoadBig32(&eeprom->Dump()[4752]), 9U) << "and can when it fits again";
+}
 
+/// Where the table has a section elsewhere, the values are written where they always are all the same.
+TEST_F(EepromTest, TablesThatHaveAnythingElsewhereChangeNothingOfWhatIsWritten) {
+    constexpr std::uint32_t lowest = 0x80000000, highest = 0x7FFFFFFF;
     struct Case {
         const char* name;
         std::size_t entry;  ///< in the table
         std::uint16_t id;
         std::uint32_t address;
+        std::size_t placeOf1211 = 4708;  ///< in the image
     };
     for (const Case& row : {
-             Case{"calibration elsewhere", 26, 1000, 4600},
-             Case{"a gap in the calibration", 29, 1206, 4632},
+             Case{"calibration elsewhere", 26, 1000, 4600, 4716},
+             Case{"a gap in the calibration", 29, 1206, 4632, 4700},
              Case{"second log elsewhere", 13, 11000, 2044},
+             Case{"second log lacks an item", 24, 1999, 0},
+             Case{"second log far behind", 15, 11002, highest},
+             Case{"second log far before", 16, 11003, lowest},
+             Case{"main log not quite there", 12, 1, 1067},
          }) {
         SCOPED_TRACE(row.name);
         eeprom.reset();
@@ -299,7 +308,16 @@ TEST_F(EepromTest, DumpRefusesWhatCannotBeReadBack) {
         Protocol::StoreBig16(entry, row.id);
         Protocol::StoreBig32(entry + 2, row.address);
         Load();
-        ExpectThrow<DataException>("corrupt EAT detected!!", [&] { eeprom->Dump(); });
+        ChangeLog(21);
+        EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites)) << "when it was due";
+        eeprom->SetProperty(1211, Long(77));
+        const Bytes image = eeprom->Dump();
+        EXPECT_EQ(Protocol::LoadBig32(&image[row.placeOf1211]), 77U);
+        EXPECT_EQ(Protocol::LoadBig32(&image[8]), 21U);
+        EXPECT_EQ(Bytes(image.begin(), image.begin() + 1064),
+                  Bytes(image.begin() + 2048, image.begin() + 3112));
+        eeprom.reset();
+        EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites)) << "at the end";
     }
 }
 
@@ -336,34 +354,61 @@ TEST_F(EepromTest, FailureInTheSecondCopyOfTheLogLeavesThatOneOld) {
     EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[2048 + 8]), 0U);
 }
 
-TEST_F(EepromTest, LogThatOutgrowsItsAreaNeverReachesTheTable) {
-    Load();
-    std::string reason;
-    eeprom->ReportLostLog([&](const std::string& text) { reason = text; });
-    eeprom->SetProperty(10021, Property(Longs(248, 1)));
-    ExpectThrow<ResourceException>("Configuration data dump target too small", [&] { eeprom->DumpLog(); });
-    eeprom.reset();
-    EXPECT_EQ(reason, "Configuration data dump target too small");
-    EXPECT_EQ(instrument.eeprom, FreshImage());
-}
-
-/// The binary block lies right behind the log, and the instrument's table knows nothing of another size.
-TEST_F(EepromTest, LogThatDoesNotFitTheInstrumentsTableStaysOffIt) {
-    Load();
-    std::string reason;
-    eeprom->ReportLostLog([&](const std::string& text) { reason = text; });
-    eeprom->SetProperty(10012, Property(Longs{1, 2, 3}));
-    ExpectThrow<DataException>("corrupt EAT detected!!", [&] { eeprom->DumpLog(); });
-    EXPECT_NO_THROW(eeprom->Dump()) << "an image has a table of its own";
-    eeprom.reset();
-    EXPECT_EQ(reason, "corrupt EAT detected!!");
-    EXPECT_EQ(instrument.eeprom, FreshImage());
-
+/// The binary block lies right behind the log, and the table further on.
+TEST_F(EepromTest, LogThatHasGrownBeyondItsAreaIsRefusedAsLongAsItIs) {
+    constexpr const char* tooSmall = "Configuration data dump target too small";
+    for (const Longs& grown : {Longs{1, 2}, Longs(248, 1), Longs(3000, 1)}) {
+        SCOPED_TRACE(grown.size());
+        Load();
+        std::string reason;
+        eeprom->ReportLostLog([&](const std::string& text) { reason = text; });
+        eeprom->SetProperty(10021, Property(grown));
+        const bool fitsAnImage = 1060 + 4 * grown.size() <= 2048;
+        if (fitsAnImage) {
+            EXPECT_NO_THROW(eeprom->Dump()) << "an image has a table of its own";
+            eeprom->SetProperty(10021, Property(grown));
+        }
+        ChangeLog(19);
+        for (int attempt = 0; attempt < 2; ++attempt) {
+            ExpectThrow<ResourceException>(tooSmall, [&] { eeprom->DumpLog(); });
+            ExpectThrow<ResourceException>(tooSmall, [&] { ChangeLog(1); });
+            ExpectThrow<ResourceException>(tooSmall, [&] { eeprom->Dump(); });
+        }
+        EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+        if (!fitsAnImage) {
+            eeprom.reset();
+            EXPECT_EQ(reason, tooSmall);
+        } else {
+            eeprom->GetLog().SetItem(10021, Long(1));
+            eeprom.reset();
+            EXPECT_EQ(reason, "");
+            EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
+        }
+        instrument.eeprom = FreshImage();
+    }
     Load();
     eeprom->SetProperty(10000, Property(Longs{1, 2}));
     EXPECT_NO_THROW(eeprom->DumpLog()) << "the checksum is one value again by then";
+    eeprom->SetProperty(10012, Property(Longs{}));
+    instrument.TakeCommands();
     eeprom.reset();
-    EXPECT_EQ(instrument.eeprom, FreshImage());
+    EXPECT_EQ(instrument.TakeCommands().at(4).size, 36U) << "a shorter log is written as it is";
+}
+
+/// A table may give the log more than its usual area, and then has nothing else there.
+TEST_F(EepromTest, LogThatWasReadLongerThanUsualIsWrittenAsLong) {
+    for (const std::size_t end : {12U, 25U}) {  // the ends of both copies, in the table
+        std::uint8_t* const address = &instrument.eeprom[4096 + 4 + 6 * end + 2];
+        const std::uint32_t usual = Protocol::LoadBig32(address);
+        Protocol::StoreBig32(address, usual + 8);
+        std::fill_n(&instrument.eeprom[usual], 8, std::uint8_t{0});
+    }
+    Load();
+    ASSERT_EQ(eeprom->GetProperty(10021).SizeOf(), 12U);
+    eeprom->DumpLog();
+    EXPECT_EQ(instrument.TakeCommands().at(9).size, 48U);
+    eeprom->SetProperty(10012, Property(Longs{1, 2}));
+    EXPECT_THAT([&] { eeprom->DumpLog(); }, testing::Throws<ResourceException>());
 }
 
 }  // namespace

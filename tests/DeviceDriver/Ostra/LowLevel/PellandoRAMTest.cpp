@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <array>
+#include <cmath>
 #include <limits>
 #include <sstream>
 #include <string>
@@ -293,6 +294,18 @@ TEST_F(ModeSearch, TakesTheFirstModeThatFits) {
             << "loads with the same time base";
         instrument.TakeCommands();
     }
+}
+
+TEST_F(ModeSearch, TakesTheProductOfTwoFloatsAsItIs) {
+    instrument.describeMode = [](std::uint8_t mode) {
+        return mode == 1 ? Answers{2, 1, 0, 13, 19, 1} : Answers{2, 2, 0, 1, 1, 1};
+    };
+    Want(247);
+    ram.Store(set);
+    EXPECT_THAT(TriedModes(), ElementsAre(1, 2)) << "247 us as a float are less, and no fraction counts";
+    set.SetProperty(2009, Property(std::nextafter(set.GetProperty(2009).AsFloat(), 1.0F)));
+    ram.Store(set);
+    EXPECT_THAT(TriedModes(), ElementsAre(1));
 }
 
 TEST_F(ModeSearch, UsesTheModesFactorForTheSecondTime) {
