@@ -1,14 +1,16 @@
 #include <fmt/format.h>
 
+#include "Commands/Commands.h"
 #include "Failure.h"
 #include "SystemCommands.h"
+#include "Win32/Diagnosis.h"
 
 namespace Varnholt::Cli {
 
 namespace SystemAdvice {
-const char* const NoneIsFound = "the device manager shows whether it is plugged in and has its driver";
-const char* const NoPermission = "end other programs that use it, or ask an administrator";
-const char* const TransferFailed = "try again; if it stays, unplug the instrument and plug it in again";
+const char* const NoneIsFound = "`ostra doctor` looks for the reason";
+const char* const NoPermission = "`ostra doctor` names the reason and the fix";
+const char* const TransferFailed = "try again; if it stays, `ostra doctor`";
 }  // namespace SystemAdvice
 
 FailureReport DescribeMissingLock(Platform::ErrorCode code) {
@@ -19,7 +21,13 @@ FailureReport DescribeMissingLock(Platform::ErrorCode code) {
                                                    : "try again; if it stays, restart Windows"};
 }
 
-void AddSystemCommands(CommandSpec, Session&) {}
+std::vector<Finding> Diagnose(Session& session) {
+    return DiagnoseDrivers(session);
+}
+
+void AddSystemCommands(CommandSpec app, Session& session) {
+    AddDoctor(app, session);
+}
 
 void PrintCandidates(Session&, bool) {
     throw ToolFailure(ExitCode::Usage, "Windows shows its USB devices in the device manager",

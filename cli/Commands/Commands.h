@@ -22,10 +22,10 @@ void AddLog(CommandSpec app, Session& session);
 void AddRam(CommandSpec app, Session& session);
 void AddBinary(CommandSpec app, Session& session);
 void AddWord(CommandSpec app, Session& session);
+void AddDoctor(CommandSpec app, Session& session);
 
 /// On Linux only; see SystemCommands.h.
 void AddRegister(CommandSpec app, Session& session);
-void AddDoctor(CommandSpec app, Session& session);
 
 using AddCommand = void (*)(CommandSpec app, Session& session);
 

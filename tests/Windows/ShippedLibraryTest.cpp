@@ -300,18 +300,23 @@ TEST_F(Shipped, LoadingAndUnloadingLeavesNothing) {
     }
 }
 
-/// Runs the host under another name, for which Wine is told where to get its setupapi from.
+/// Tells Wine where the program of that name gets its setupapi from.
+void ChooseSetupApi(const std::string& program, const std::string& origin) {
+    HKEY key = nullptr;
+    RegCreateKeyExA(HKEY_CURRENT_USER, ("Software\\Wine\\AppDefaults\\" + program + "\\DllOverrides").c_str(),
+                    0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr);
+    RegSetValueExA(key, "setupapi", 0, REG_SZ, reinterpret_cast<const BYTE*>(origin.c_str()),
+                   static_cast<DWORD>(origin.size() + 1));
+    RegCloseKey(key);
+}
+
+/// Runs the host under another name, with a setupapi of its own.
 DWORD RunHostWithoutEnumeration(const std::string& folder, const std::string& name,
                                 const std::string& origin) {
     CreateDirectoryA(folder.c_str(), nullptr);
     const std::string program = folder + "\\" + name;
     CopyFileA(Shipped::hostWithoutEnumeration.c_str(), program.c_str(), FALSE);
-    HKEY key = nullptr;
-    RegCreateKeyExA(HKEY_CURRENT_USER, ("Software\\Wine\\AppDefaults\\" + name + "\\DllOverrides").c_str(), 0,
-                    nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr);
-    RegSetValueExA(key, "setupapi", 0, REG_SZ, reinterpret_cast<const BYTE*>(origin.c_str()),
-                   static_cast<DWORD>(origin.size() + 1));
-    RegCloseKey(key);
+    ChooseSetupApi(name, origin);
     return ChildProcess(ChildProcess::Program{'"' + program + "\" \"" + ShippedLibrary::path + '"'}).Wait();
 }
 
@@ -364,6 +369,42 @@ TEST_F(Shipped, ProgramsDoTheWholeJob) {
                 testing::ElementsAreArray(ReadoutInProcess(driver->SeedOf(path))));
     const std::string image = Content("C:\\image");
     EXPECT_EQ(Instrument(path).Eeprom(), std::vector<BYTE>(image.begin(), image.end()));
+}
+
+/// The doctor's exit code and JSON.
+std::pair<DWORD, std::string> Doctor(const std::string& program = Shipped::tool) {
+    return RunProgram(Quoted(program) + " doctor --json");
+}
+
+TEST_F(Shipped, DoctorNamesTheReason) {
+    const bool is64Bit = StandInDriver::HostIs64Bit();
+    const auto expect = [](const std::pair<DWORD, std::string>& told, DWORD code, const std::string& text) {
+        EXPECT_EQ(told.first, code) << told.second;
+        EXPECT_THAT(told.second, HasSubstr(text));
+    };
+    expect(Doctor(), 3, "no device with either driver is plugged in");
+    const std::string path = driver->PlugIn();
+    expect(Doctor(), 0, "answers (firmware ");
+    expect(Doctor(), 0,
+           is64Bit ? "on 64-bit Windows the USBIO driver is used; devices present: 1"
+                   : "on 32-bit Windows the instrument's own driver is used; devices present: 1");
+    expect(RunProgram(Quoted(tool) + " doctor --json --transport " + (is64Bit ? "native" : "usbio")), 3,
+           "which is not used here: --transport asks for");
+    if (is64Bit) {
+        Instrument(path).SetInterfaceVersion(0x0300);
+        expect(Doctor(), 3, "has a USBIO driver of interface version 3.00");
+        Instrument(path).SetInterfaceVersion(0x0230);
+    }
+    // Wine is told which setupapi.dll these programs get.
+    CreateDirectoryA("C:\\doctor", nullptr);
+    ASSERT_TRUE(CopyFileA(tool.c_str(), "C:\\doctor\\doctor.exe", FALSE));
+    ChooseSetupApi("doctor.exe", "");
+    expect(Doctor("C:\\doctor\\doctor.exe"), 3, "setupapi.dll, which finds instruments, cannot be loaded");
+    ASSERT_TRUE(CopyFileA(poorSetupApi.c_str(), "C:\\doctor\\setupapi.dll", FALSE));
+    ChooseSetupApi("doctor.exe", "native");
+    expect(Doctor("C:\\doctor\\doctor.exe"), 3, "setupapi.dll, which finds instruments, lacks functions");
+    Instrument(path).UseElsewhere();
+    expect(Doctor(), 4, "used by another process");
 }
 
 TEST_F(Shipped, ToolShowsTheButtonAndTheRemoval) {
