@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <ostream>
-#include <utility>
 
 #include "Instrument.h"
 #include "Output/Json.h"
@@ -50,7 +49,7 @@ void Session::CarryOut() {
 }
 
 void Session::BeginRecording() {
-    if (recording && !std::exchange(recordingHasBegun, true)) {
+    if (recording) {
         recording->Begin();
     }
 }

@@ -91,7 +91,6 @@ class Session final {
     Surroundings& where;
     Interruption& interruption;
     std::unique_ptr<TrafficRecording> recording;
-    bool recordingHasBegun = false;
     std::optional<LoggedDeviceFiles> loggedFiles;             // stand on those of the recording
     std::optional<Platform::InterruptibleDeviceFiles> files;  // stand on those before
     std::optional<Platform::ScopedDeviceFiles> filesInForce;

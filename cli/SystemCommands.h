@@ -32,8 +32,8 @@ void PrintCandidates(Session& session, bool json);
 class TrafficRecording {
   public:
     virtual ~TrafficRecording() = default;
-    /// Makes the file, or empties the one that is there. Before that nothing is recorded. Throws
-    /// `ToolFailure`.
+    /// Makes the file, or empties the one that is there; once, however often it is called. Before that
+    /// nothing is recorded. Throws `ToolFailure`.
     virtual void Begin() = 0;
     /// Throws `ToolFailure` when something could not be written.
     virtual void Check() const = 0;

@@ -23,7 +23,7 @@ class BusRecording final : public TrafficRecording, private Platform::Usb::UsbBu
 
     void Begin() override {
         if (writer) {
-            return;  // the doctor opens one instrument after another
+            return;
         }
         writer.emplace(name, "ostra " OSTRA_VERSION);
         Check();
