@@ -114,7 +114,8 @@ class Round final {
         EXPECT_TRUE(succeeded || Platform::LastError() == Errors::OperationAborted) << Platform::LastError();
         EXPECT_TRUE(read.request.TakeSignal()) << "not signalled";
         EXPECT_FALSE(read.request.TakeSignal()) << "signalled twice";
-        collected.insert(collected.end(), read.buffer.begin(), read.buffer.begin() + moved);
+        collected.insert(collected.end(), read.buffer.begin(),
+                         read.buffer.begin() + static_cast<std::ptrdiff_t>(moved));
         cutOff += moved > 0 && moved < read.buffer.size() ? 1 : 0;
     }
 
