@@ -63,7 +63,8 @@ TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
         {"garbage of the same size",
          [](const std::string& file) {
              const OwnedHandle mutex(MakeMutex(UniqueName("size")));
-             const auto size = std::filesystem::file_size(PathOf(UniqueName("size")));
+             const auto size =
+                 static_cast<std::size_t>(std::filesystem::file_size(PathOf(UniqueName("size"))));
              std::ofstream(file) << std::string(size, '\x5A');
          }},
     };
