@@ -262,6 +262,8 @@ TEST(ImageCheckTest, FindsWhatIsWrong) {
                       std::fill_n(image.begin() + 1064, 4, std::uint8_t{0});
                   },
                   "warning log: it reaches into the binary block", true},
+             Case{"gap in the calibration", [](EepromImage& image) { SetEntry(image, 29, 1206, 4632); },
+                  "warning table: calibration values cannot be changed", true},
              Case{"repeated", [](EepromImage& image) { SetEntry(image, 28, 1001, 4616); },
                   "warning table: 1 entries repeat an identifier", true},
              Case{"no number", [](EepromImage& image) { std::fill_n(image.begin() + 4608, 4, 0xFF); },
