@@ -82,7 +82,7 @@ TEST_F(RamAccessTest, WhatWasLoadedIsKeptAtTheEndsOfEveryMode) {
     }
 }
 
-/// Rounding depends on time base and count alone. All 16.7 million of them take minutes.
+/// Rounding depends on time base and count alone. All 16.7 million of them take half a minute.
 TEST_F(RamAccessTest, WhatWasLoadedIsKeptAtEveryCountOfEveryTimeBase) {
     const char* const wish = std::getenv("OSTRA_LONG");
     const std::uint32_t step = wish != nullptr && std::string_view(wish) == "1" ? 1 : 509;
