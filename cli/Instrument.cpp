@@ -26,14 +26,14 @@ std::string Joined(const std::vector<std::string>& names) {
 
 }  // namespace
 
-std::vector<std::string> ConnectedInstruments() {
-    const auto paths = USBBrowser::Instance()->GetDevices(0);
+std::vector<std::string> ConnectedInstruments(DeviceDriver::Ostra::Transport transport) {
+    const auto paths = USBBrowser::Instance(transport)->GetDevices(0);
     return {paths.begin(), paths.end()};
 }
 
-bool IsConnected(const std::string& identifier) {
+bool IsConnected(const std::string& identifier, DeviceDriver::Ostra::Transport transport) {
     try {
-        const auto connected = ConnectedInstruments();
+        const auto connected = ConnectedInstruments(transport);
         return std::find(connected.begin(), connected.end(), identifier) != connected.end();
     } catch (...) {  // who asks is already reporting a failure
         return true;
@@ -90,8 +90,8 @@ std::size_t FindInstrument(const std::vector<std::string>& identifiers, const st
 Instrument::Instrument(Session& usedSession, const InstrumentOptions& options, Choice choice,
                        DeviceDriver::Generic::EventListener* listener)
     : session(usedSession), messageListener(listener) {
-    session.UseTransport(options.transport);
-    const std::vector<std::string> connected = ConnectedInstruments();
+    session.ChooseTransport(options.transport);
+    const std::vector<std::string> connected = ConnectedInstruments(session.UsedTransport());
     const bool byChip = NamesChip(options.device) && !connected.empty();
     const std::size_t index =
         FindInstrument(connected, byChip ? FindByChipId(session, connected, options) : options.device);
@@ -107,7 +107,7 @@ Instrument::Instrument(Session& usedSession, const InstrumentOptions& options, C
     session.BeginRecording();
     std::string opened;
     try {
-        transport = Transport::Instance(listener, static_cast<std::uint32_t>(index));
+        transport = Transport::Instance(listener, static_cast<std::uint32_t>(index), session.UsedTransport());
         transport->SetDataStageObserver(&wholeData);
         transport->GetDeviceIdentifier(opened);
         if (opened == identifier) {

@@ -16,9 +16,9 @@ struct InstrumentOptions {
     std::string transport;  ///< "native", "usbio" or empty
 };
 
-/// The identifiers of the instruments that are connected, on the transport in force.
-std::vector<std::string> ConnectedInstruments();
-bool IsConnected(const std::string& identifier);
+/// The identifiers of the instruments that are connected, as this transport names them.
+std::vector<std::string> ConnectedInstruments(DeviceDriver::Ostra::Transport transport);
+bool IsConnected(const std::string& identifier, DeviceDriver::Ostra::Transport transport);
 
 /// What people call an instrument: its place or serial number, without the driver's part of the identifier.
 std::string ShortNameOf(const std::string& identifier);

@@ -5,7 +5,6 @@
 
 #include "Instrument.h"
 #include "Output/Json.h"
-#include "Platform/HostQueries.h"
 #include "SystemCommands.h"
 
 namespace Varnholt::Cli {
@@ -20,11 +19,10 @@ constexpr int WidestPlot = 120;
 }  // namespace
 
 Session::Session(Surroundings& surroundings, Interruption& userInterruption)
-    : where(surroundings), interruption(userInterruption), transportBefore(Platform::Overridden64BitHost()) {}
+    : where(surroundings), interruption(userInterruption) {}
 
 Session::~Session() {
     interruption.SetAction({});
-    Platform::Override64BitHost(transportBefore);
 }
 
 void Session::CarryOut() {
@@ -121,9 +119,10 @@ PlotStyle Session::StyleOfPlots() const {
     return style;
 }
 
-void Session::UseTransport(const std::string& transport) {
-    if (!transport.empty()) {
-        Platform::Override64BitHost(transport == "usbio");
+void Session::ChooseTransport(const std::string& name) {
+    using DeviceDriver::Ostra::Transport;
+    if (!name.empty()) {
+        chosenTransport = name == "usbio" ? Transport::UsbIo : Transport::Native;
     }
 }
 
@@ -142,7 +141,7 @@ FailureReport Session::Explain(const std::exception_ptr& failure) const {
     if (isOwn || instrumentInUse.empty()) {
         return report;
     }
-    if (report.code == ExitCode::InputOutput && !IsConnected(instrumentInUse)) {
+    if (report.code == ExitCode::InputOutput && !IsConnected(instrumentInUse, UsedTransport())) {
         report = {ExitCode::NoInstrument, "unplugged (" + report.message + ")",
                   "plug it in again; `ostra list` shows whether it is found"};
     }

@@ -8,6 +8,7 @@
 #include <span>
 #include <string>
 
+#include "DeviceDriver/Ostra/Transport.h"
 #include "Failure.h"
 #include "Interruption.h"
 #include "LoggedDeviceFiles.h"
@@ -71,8 +72,12 @@ class Session final {
     /// opened.
     void BeginRecording();
 
-    /// "native", "usbio", or empty: what the platform prefers.
-    void UseTransport(const std::string& transport);
+    /// "native", "usbio", or empty: that of this host.
+    void ChooseTransport(const std::string& name);
+    bool IsTransportChosen() const { return chosenTransport.has_value(); }
+    DeviceDriver::Ostra::Transport UsedTransport() const {
+        return chosenTransport ? *chosenTransport : DeviceDriver::Ostra::HostTransport();
+    }
 
     /// Sorts the failure of a command, with what is known of the instrument that it worked on.
     FailureReport Explain(const std::exception_ptr& failure) const;
@@ -94,7 +99,7 @@ class Session final {
     std::optional<LoggedDeviceFiles> loggedFiles;             // stand on those of the recording
     std::optional<Platform::InterruptibleDeviceFiles> files;  // stand on those before
     std::optional<Platform::ScopedDeviceFiles> filesInForce;
-    const std::optional<bool> transportBefore;
+    std::optional<DeviceDriver::Ostra::Transport> chosenTransport;
     std::string instrumentInUse;
     bool outIsClaimed = false;
     bool inIsClaimed = false;

@@ -27,7 +27,7 @@ const char* NameOf(Finding::Level level) {
 }
 
 void Doctor(Session& session, const Options& options) {
-    session.UseTransport(options.transport);
+    session.ChooseTransport(options.transport);
     const std::vector<Finding> findings = Diagnose(session);
     Json list = Json::array();
     ExitCode code = ExitCode::Success;

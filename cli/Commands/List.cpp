@@ -6,7 +6,6 @@
 #include "Output/Json.h"
 #include "Output/Table.h"
 #include "SystemCommands.h"
-#include "Utilities/Tools/Win32/SystemHelperWin.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -23,9 +22,9 @@ void List(Session& session, const Options& options) {
         PrintCandidates(session, options.json);
         return;
     }
-    session.UseTransport(options.instrument.transport);
-    const std::string transport = Utilities::Tools::Is64BitOS() ? "usbio" : "native";
-    const std::vector<std::string> connected = ConnectedInstruments();
+    session.ChooseTransport(options.instrument.transport);
+    const bool isUsbIo = session.UsedTransport() == DeviceDriver::Ostra::Transport::UsbIo;
+    const std::vector<std::string> connected = ConnectedInstruments(session.UsedTransport());
     Json instruments = Json::array();
     Table table({{"NAME"}, {"IDENTIFIER"}, {options.chipId ? "CHIP ID" : ""}});
     std::optional<FailureReport> failure;  // one that is used by others is none
@@ -50,7 +49,7 @@ void List(Session& session, const Options& options) {
         table.AddRow({ShortNameOf(identifier), identifier, chipId});
     }
     if (options.json) {
-        session.Print({{"transport", transport}, {"instruments", instruments}});
+        session.Print({{"transport", isUsbIo ? "usbio" : "native"}, {"instruments", instruments}});
     } else if (!connected.empty()) {
         table.Print(session.Out());
     }

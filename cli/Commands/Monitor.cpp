@@ -53,7 +53,7 @@ constexpr int LooksForAGoneOne = 50;
 /// The end of the messages looks like a removal, whatever ended them.
 bool IsRemoved(Session& session, const std::string& identifier) {
     for (int look = 0; look < LooksForAGoneOne; ++look) {
-        if (!IsConnected(identifier)) {
+        if (!IsConnected(identifier, session.UsedTransport())) {
             return true;
         }
         if (!session.UserInterruption().Sleep(LookInterval)) {

@@ -10,7 +10,6 @@
 #include "Output/Json.h"
 #include "Protocol/Instrument.h"
 #include "ScanRecorder.h"
-#include "Utilities/Tools/Win32/SystemHelperWin.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -85,7 +84,7 @@ void RunScan(Session& session, Instrument& instrument, const Options& options, s
     }
 }
 
-std::uint32_t TotalOf(const Options& options) {
+std::uint32_t TotalOf(const Options& options, DeviceDriver::Ostra::Transport transport) {
     const std::uint64_t total =
         options.records > 0 ? std::uint64_t{options.records} * options.recordSize : options.total;
     if (total > 0xFFFFFFFF) {
@@ -96,7 +95,7 @@ std::uint32_t TotalOf(const Options& options) {
                           "an even --record-size, or --raw");
     }
     // Its driver drops a last record that is not whole.
-    if (!Utilities::Tools::Is64BitOS() && total % options.recordSize != 0) {
+    if (transport == DeviceDriver::Ostra::Transport::Native && total % options.recordSize != 0) {
         throw ToolFailure(
             ExitCode::Usage,
             fmt::format("over the transport native --total is a multiple of --record-size: {} is none of {}",
@@ -186,8 +185,8 @@ void CheckForm(const Options& options) {
 }
 
 void Scan(Session& session, const Options& options) {
-    session.UseTransport(options.instrument.transport);
-    const std::uint32_t total = TotalOf(options);
+    session.ChooseTransport(options.instrument.transport);
+    const std::uint32_t total = TotalOf(options, session.UsedTransport());
     CheckForm(options);
     const auto output = MakeRecordOutput(session, options.output, options.raw);
     std::string identifier;

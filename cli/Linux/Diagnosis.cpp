@@ -14,7 +14,6 @@
 #include "Linux/UdevRule.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Session.h"
-#include "Utilities/Tools/Win32/SystemHelperWin.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -163,7 +162,7 @@ std::string GroupOf(const std::string& file) {
     return owner == nullptr ? "" : owner->gr_name;
 }
 
-MachineFacts LookAround() {
+MachineFacts LookAround(const Session& session) {
     MachineFacts facts;
     for (const UsbDeviceInfo& device : Platform::Usb::ListCandidateDevices()) {
         facts.devices.push_back({device, true, access(device.deviceNode.c_str(), R_OK | W_OK) == 0,
@@ -181,12 +180,12 @@ MachineFacts LookAround() {
     facts.hasUsb = std::filesystem::exists("/sys/bus/usb", ignored);
     facts.group = LookAtGroup();
     facts.missingLock = TryLocks();
-    facts.needsLock = !Utilities::Tools::Is64BitOS();
+    facts.needsLock = session.UsedTransport() == DeviceDriver::Ostra::Transport::Native;
     return facts;
 }
 
 Answer Try(Session& session, const std::string& shortName) {
-    const std::vector<std::string> connected = ConnectedInstruments();
+    const std::vector<std::string> connected = ConnectedInstruments(session.UsedTransport());
     const auto listed = std::ranges::find(connected, shortName, &ShortNameOf);
     if (listed == connected.end()) {
         return {0, FailureReport{ExitCode::NoInstrument, "the library does not list it", Replug}};
@@ -227,7 +226,7 @@ std::vector<Finding> Judge(const MachineFacts& facts, const Trial& trial) {
 }
 
 std::vector<Finding> Diagnose(Session& session) {
-    return Judge(LookAround(), [&session](const std::string& name) { return Try(session, name); });
+    return Judge(LookAround(session), [&session](const std::string& name) { return Try(session, name); });
 }
 
 }  // namespace Varnholt::Cli

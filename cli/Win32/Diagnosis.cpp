@@ -9,14 +9,12 @@
 #include "Instrument.h"
 #include "Platform/DeviceFiles.h"
 #include "Platform/DeviceInterfaces.h"
-#include "Platform/HostQueries.h"
 #include "Platform/OverlappedRequest.h"
 #include "Platform/WaitableObjects.h"
 #include "Protocol/NativeDriver.h"
 #include "Protocol/UsbIoDriver.h"
 #include "SystemCommands.h"
 #include "UsbIo/UsbIoRecords.h"
-#include "Utilities/Tools/Win32/SystemHelperWin.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -41,11 +39,11 @@ std::vector<std::string> PathsOf(const DriverFacts& driver) {
     return Platform::DeviceFiles().ListInterfaces(driver.interfaceClass);
 }
 
-std::string WhyThisDriver(bool usesUsbIo) {
+std::string WhyThisDriver(const Session& session, bool usesUsbIo) {
     const DriverFacts& driver = usesUsbIo ? UsbIoDriver : OwnDriver;
-    const bool isAskedFor = Platform::Overridden64BitHost().has_value();
-    return isAskedFor ? fmt::format("--transport asks for {}", driver.name)
-                      : fmt::format("on {}-bit Windows {} is used", usesUsbIo ? "64" : "32", driver.name);
+    return session.IsTransportChosen()
+               ? fmt::format("--transport asks for {}", driver.name)
+               : fmt::format("on {}-bit Windows {} is used", usesUsbIo ? "64" : "32", driver.name);
 }
 
 Finding DescribeMissingEnumeration(ErrorCode code) {
@@ -132,7 +130,7 @@ Finding JudgeInstrument(Session& session, const std::string& path, bool usesUsbI
     if (auto obstacle = usesUsbIo ? LookAtUsbIo(path) : LookAtLock(path)) {
         return *obstacle;
     }
-    const std::vector<std::string> connected = ConnectedInstruments();
+    const std::vector<std::string> connected = ConnectedInstruments(session.UsedTransport());
     if (std::ranges::find(connected, path) == connected.end()) {
         return {Level::Problem, path, "is not listed by the library, because one before it cannot be opened",
                 "what is to be done for that one, or unplug it", ExitCode::NoInstrument};
@@ -143,7 +141,7 @@ Finding JudgeInstrument(Session& session, const std::string& path, bool usesUsbI
 }  // namespace
 
 std::vector<Finding> DiagnoseDrivers(Session& session) {
-    const bool usesUsbIo = Utilities::Tools::Is64BitOS();
+    const bool usesUsbIo = session.UsedTransport() == DeviceDriver::Ostra::Transport::UsbIo;
     const DriverFacts& used = usesUsbIo ? UsbIoDriver : OwnDriver;
     const DriverFacts& other = usesUsbIo ? OwnDriver : UsbIoDriver;
     const bool canList = Platform::DeviceInterfaces::Load();
@@ -155,17 +153,18 @@ std::vector<Finding> DiagnoseDrivers(Session& session) {
         findings.push_back(DescribeMissingEnumeration(loadFailure));
         return findings;
     }
-    findings.push_back({Level::Note, "",
-                        fmt::format("{}; devices present: {} with it, {} with {}", WhyThisDriver(usesUsbIo),
-                                    instruments.size(), others.size(), other.name),
-                        ""});
+    findings.push_back(
+        {Level::Note, "",
+         fmt::format("{}; devices present: {} with it, {} with {}", WhyThisDriver(session, usesUsbIo),
+                     instruments.size(), others.size(), other.name),
+         ""});
     for (const std::string& path : instruments) {
         findings.push_back(JudgeInstrument(session, path, usesUsbIo));
     }
     for (const std::string& path : others) {
         findings.push_back(
             {Level::Problem, path,
-             fmt::format("has {}, which is not used here: {}", other.name, WhyThisDriver(usesUsbIo)),
+             fmt::format("has {}, which is not used here: {}", other.name, WhyThisDriver(session, usesUsbIo)),
              fmt::format("let the device manager install {} for it", used.whatToInstall),
              ExitCode::NoInstrument});
     }

@@ -12,7 +12,8 @@ class ScanReceiver {
 
     /// The next bytes of the scan, in order and of any number, on the thread of `StartScan`, while the
     /// transfer behind them runs already. They are there for the call only. What it throws ends the scan and
-    /// leaves `StartScan`.
+    /// leaves `StartScan`, like everything that does: what is no exception of the library becomes one, with
+    /// its text alone.
     virtual void Receive(std::span<const std::uint8_t> data) = 0;
 };
 
