@@ -10,21 +10,21 @@ namespace Varnholt::Bench {
 
 using Platform::Usb::Transfer;
 
-BareLoop::BareLoop(Platform::Usb::UsbDevice& usbDevice) : device(usbDevice) {
-    if (device.Claim() != Platform::Errors::Success) {
+BareLoop::BareLoop(Platform::Usb::UsbDevice& usbDevice) : device_(usbDevice) {
+    if (device_.Claim() != Platform::Errors::Success) {
         throw std::runtime_error("the device is in use");
     }
 }
 
 BareLoop::~BareLoop() {
-    device.Release();
-    for (Chunk* chunk : {&chunks[0], &chunks[1], &control}) {
+    device_.Release();
+    for (Chunk* chunk : {&chunks_[0], &chunks_[1], &control_}) {
         Platform::Close(chunk->completed);
     }
 }
 
 void BareLoop::TransferCompleted(Transfer& transfer) noexcept {
-    for (Chunk* chunk : {&chunks[0], &chunks[1], &control}) {
+    for (Chunk* chunk : {&chunks_[0], &chunks_[1], &control_}) {
         if (&chunk->transfer == &transfer) {
             Platform::SignalEvent(chunk->completed);
         }
@@ -35,7 +35,7 @@ void BareLoop::Start(Chunk& chunk, std::uint32_t length) {
     chunk.transfer.data = chunk.bytes.data();
     chunk.transfer.length = length;
     chunk.transfer.client = this;
-    if (device.Submit(chunk.transfer) != Platform::Errors::Success) {
+    if (device_.Submit(chunk.transfer) != Platform::Errors::Success) {
         throw std::runtime_error("transfer refused");
     }
 }
@@ -45,11 +45,11 @@ void BareLoop::Finish(Chunk& chunk) {
 }
 
 void BareLoop::Read(std::uint64_t total, std::vector<std::uint8_t>& result) {
-    control.transfer.endpoint = 0;
-    control.transfer.setup = {Protocol::VendorOut, static_cast<std::uint8_t>(Protocol::Request::Measure), 0,
-                              0, 0};
-    Start(control, 0);
-    Finish(control);
+    control_.transfer.endpoint = 0;
+    control_.transfer.setup = {Protocol::VendorOut, static_cast<std::uint8_t>(Protocol::Request::Measure), 0,
+                               0, 0};
+    Start(control_, 0);
+    Finish(control_);
 
     std::uint64_t asked = 0;
     std::uint64_t received = 0;
@@ -64,10 +64,10 @@ void BareLoop::Read(std::uint64_t total, std::vector<std::uint8_t>& result) {
         }
         return length > 0;
     };
-    next(chunks[0]);
-    next(chunks[1]);
-    for (std::size_t current = 0; chunks[current].transfer.length > 0; current ^= 1) {
-        Chunk& chunk = chunks[current];
+    next(chunks_[0]);
+    next(chunks_[1]);
+    for (std::size_t current = 0; chunks_[current].transfer.length > 0; current ^= 1) {
+        Chunk& chunk = chunks_[current];
         Finish(chunk);
         const std::uint32_t moved = chunk.transfer.actualLength;
         if (result.size() < received + moved) {
@@ -76,9 +76,9 @@ void BareLoop::Read(std::uint64_t total, std::vector<std::uint8_t>& result) {
         std::memcpy(result.data() + received, chunk.bytes.data(), moved);
         received += moved;
         if (moved < chunk.transfer.length) {
-            Chunk& other = chunks[current ^ 1];
+            Chunk& other = chunks_[current ^ 1];
             if (other.transfer.length > 0) {
-                device.Cancel(other.transfer);
+                device_.Cancel(other.transfer);
                 Finish(other);
             }
             break;

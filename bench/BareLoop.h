@@ -33,9 +33,9 @@ class BareLoop final : private Platform::Usb::TransferClient {
     void Start(Chunk& chunk, std::uint32_t length);
     void Finish(Chunk& chunk);
 
-    Platform::Usb::UsbDevice& device;
-    std::array<Chunk, 2> chunks;
-    Chunk control;
+    Platform::Usb::UsbDevice& device_;
+    std::array<Chunk, 2> chunks_;
+    Chunk control_;
 };
 
 }  // namespace Varnholt::Bench

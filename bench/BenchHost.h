@@ -20,7 +20,7 @@ class BenchHost final {
     BenchHost(bool overUsbIo, Simulator::InstrumentSettings settings) {
         Platform::Override64BitHost(overUsbIo);
         Platform::ObserveBeeps([](std::uint32_t, std::uint32_t) {});
-        bus.Add("bench", std::move(settings));
+        bus_.Add("bench", std::move(settings));
     }
     ~BenchHost() {
         Platform::ObserveBeeps({});
@@ -31,13 +31,13 @@ class BenchHost final {
 
     std::shared_ptr<Platform::Usb::UsbDevice> Open() {
         Platform::ErrorCode error = 0;
-        return bus.Open("bench", error);
+        return bus_.Open("bench", error);
     }
 
   private:
-    Simulator::SimulatedBus bus{Platform::ClockScheduler()};
-    const std::unique_ptr<Platform::DeviceFileSystem> files = Platform::Drivers::MakeDriverFileSystem(bus);
-    const Platform::ScopedDeviceFiles inForce{*files};
+    Simulator::SimulatedBus bus_{Platform::ClockScheduler()};
+    const std::unique_ptr<Platform::DeviceFileSystem> files_ = Platform::Drivers::MakeDriverFileSystem(bus_);
+    const Platform::ScopedDeviceFiles inForce_{*files_};
 };
 
 inline double Seconds(const std::function<void()>& action) {

@@ -34,27 +34,27 @@ CLI::Option* OfIntegers(CLI::Option* option) {
 // The checks have no words of their own in the help: the option's text says it.
 
 OptionSpec& OptionSpec::Type(const char* placeholder) {
-    option->type_name(placeholder);
+    option_->type_name(placeholder);
     return *this;
 }
 
 OptionSpec& OptionSpec::Group(const char* heading) {
-    option->group(heading);
+    option_->group(heading);
     return *this;
 }
 
 OptionSpec& OptionSpec::Required() {
-    option->required();
+    option_->required();
     return *this;
 }
 
 OptionSpec& OptionSpec::Excludes(const char* name) {
-    option->excludes(name);
+    option_->excludes(name);
     return *this;
 }
 
 OptionSpec& OptionSpec::Needs(const char* name) {
-    option->needs(name);
+    option_->needs(name);
     return *this;
 }
 
@@ -72,28 +72,28 @@ OptionSpec& OptionSpec::Between(double lowest, double highest) {
 }
 
 OptionSpec& OptionSpec::OneOf(const std::vector<std::string>& values) {
-    option->check(CLI::IsMember(values).description(""));
+    option_->check(CLI::IsMember(values).description(""));
     return *this;
 }
 
 OptionSpec& OptionSpec::Check(std::function<std::string(const std::string& text)> check) {
-    option->check(CLI::Validator([check = std::move(check)](std::string& text) { return check(text); }, ""));
+    option_->check(CLI::Validator([check = std::move(check)](std::string& text) { return check(text); }, ""));
     return *this;
 }
 
 CommandSpec CommandSpec::AddCommand(const char* name, const char* about) {
-    return CommandSpec(command->add_subcommand(name, about));
+    return CommandSpec(command_->add_subcommand(name, about));
 }
 
 CommandSpec CommandSpec::AddGroup(const char* name, const char* about) {
-    CLI::App* const group = command->add_subcommand(name, about);
+    CLI::App* const group = command_->add_subcommand(name, about);
     group->require_subcommand(1);
     return CommandSpec(group);
 }
 
 template <class Target>
 CLI::Option* CommandSpec::AddOption(const char* names, Target& target, const char* about) {
-    CLI::Option* const option = command->add_option(names, target, about);
+    CLI::Option* const option = command_->add_option(names, target, about);
     if (option->get_positional() && option->get_lnames().empty()) {
         option->type_name("");  // its name says what it is
     }
@@ -127,15 +127,15 @@ OptionSpec CommandSpec::Add(const char* names, std::vector<std::uint16_t>& targe
 }
 
 OptionSpec CommandSpec::AddFlag(const char* names, bool& target, const char* about) {
-    return OptionSpec(command->add_flag(names, target, about));
+    return OptionSpec(command_->add_flag(names, target, about));
 }
 
 void CommandSpec::Footer(const char* text) {
-    command->footer(text);
+    command_->footer(text);
 }
 
 void CommandSpec::WhenChosen(std::function<void()> call) {
-    command->callback(std::move(call));
+    command_->callback(std::move(call));
 }
 
 }  // namespace Varnholt::Cli

@@ -15,7 +15,7 @@ namespace Varnholt::Cli {
 /// An option, flag or argument of a command. Each operation answers the option, so that they can be chained.
 class OptionSpec final {
   public:
-    explicit OptionSpec(CLI::Option* parserOption) : option(parserOption) {}
+    explicit OptionSpec(CLI::Option* parserOption) : option_(parserOption) {}
 
     /// What stands for the value in the help.
     OptionSpec& Type(const char* placeholder);
@@ -31,7 +31,7 @@ class OptionSpec final {
     OptionSpec& Check(std::function<std::string(const std::string& text)> check);
 
   private:
-    CLI::Option* option;
+    CLI::Option* option_;
 };
 
 /// A command, or a group of commands, while the command line is being built: the parser behind it is seen by
@@ -39,7 +39,7 @@ class OptionSpec final {
 /// the option is not given. A text may not be empty: in a script that is a variable that was never set.
 class CommandSpec final {
   public:
-    explicit CommandSpec(CLI::App* parserCommand) : command(parserCommand) {}
+    explicit CommandSpec(CLI::App* parserCommand) : command_(parserCommand) {}
 
     CommandSpec AddCommand(const char* name, const char* about);
     /// A group: one of its commands must be named.
@@ -62,7 +62,7 @@ class CommandSpec final {
     template <class Target>
     CLI::Option* AddOption(const char* names, Target& target, const char* about);
 
-    CLI::App* command;
+    CLI::App* command_;
 };
 
 }  // namespace Varnholt::Cli

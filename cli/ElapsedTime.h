@@ -12,14 +12,14 @@ class ElapsedTime final {
   public:
     std::uint64_t Milliseconds() {
         const std::uint32_t now = Platform::TickCount();
-        elapsed += now - last;
-        last = now;
-        return elapsed;
+        elapsed_ += now - last_;
+        last_ = now;
+        return elapsed_;
     }
 
   private:
-    std::uint32_t last = Platform::TickCount();
-    std::uint64_t elapsed = 0;
+    std::uint32_t last_ = Platform::TickCount();
+    std::uint64_t elapsed_ = 0;
 };
 
 }  // namespace Varnholt::Cli

@@ -13,14 +13,14 @@ namespace Varnholt::Cli {
 class ToolFailure final : public std::runtime_error {
   public:
     ToolFailure(ExitCode exitCode, const std::string& message, std::string wayOut = {})
-        : std::runtime_error(message), code(exitCode), advice(std::move(wayOut)) {}
+        : std::runtime_error(message), code_(exitCode), advice_(std::move(wayOut)) {}
 
-    ExitCode Code() const { return code; }
-    const std::string& Advice() const { return advice; }
+    ExitCode Code() const { return code_; }
+    const std::string& Advice() const { return advice_; }
 
   private:
-    ExitCode code;
-    std::string advice;
+    ExitCode code_;
+    std::string advice_;
 };
 
 /// A failure as the user reads it.

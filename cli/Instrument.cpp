@@ -89,60 +89,61 @@ std::size_t FindInstrument(const std::vector<std::string>& identifiers, const st
 
 Instrument::Instrument(Session& usedSession, const InstrumentOptions& options, Choice choice,
                        DeviceDriver::Generic::EventListener* listener)
-    : session(usedSession), messageListener(listener) {
-    session.ChooseTransport(options.transport);
-    const std::vector<std::string> connected = ConnectedInstruments(session.UsedTransport());
+    : session_(usedSession), messageListener_(listener) {
+    session_.ChooseTransport(options.transport);
+    const std::vector<std::string> connected = ConnectedInstruments(session_.UsedTransport());
     const bool byChip = NamesChip(options.device) && !connected.empty();
     const std::size_t index =
-        FindInstrument(connected, byChip ? FindByChipId(session, connected, options) : options.device);
-    identifier = connected[index];
+        FindInstrument(connected, byChip ? FindByChipId(session_, connected, options) : options.device);
+    identifier_ = connected[index];
     if (options.device.empty() && connected.size() > 1) {
         if (choice == Choice::MustBeNamed) {
             throw ToolFailure(ExitCode::Usage, "several instruments are connected",
                               "say which one with --device: " + Joined(connected));
         }
-        session.Note("taking " + identifier + ", the first of " + std::to_string(connected.size()) +
-                     " (--device names another)");
+        session_.Note("taking " + identifier_ + ", the first of " + std::to_string(connected.size()) +
+                      " (--device names another)");
     }
-    session.BeginRecording();
+    session_.BeginRecording();
     std::string opened;
     try {
-        transport = Transport::Instance(listener, static_cast<std::uint32_t>(index), session.UsedTransport());
-        transport->SetDataStageObserver(&wholeData);
-        transport->GetDeviceIdentifier(opened);
-        if (opened == identifier) {
-            commands = SmartPointer<CommandSet>(new CommandSet(transport));
+        transport_ =
+            Transport::Instance(listener, static_cast<std::uint32_t>(index), session_.UsedTransport());
+        transport_->SetDataStageObserver(&wholeData_);
+        transport_->GetDeviceIdentifier(opened);
+        if (opened == identifier_) {
+            commands_ = SmartPointer<CommandSet>(new CommandSet(transport_));
         }
     } catch (...) {
-        session.Files().Resume();
-        session.UserInterruption().ThrowIfRequested();
+        session_.Files().Resume();
+        session_.UserInterruption().ThrowIfRequested();
         FailureReport report = Describe(std::current_exception());
-        if (const std::string holder = HolderOf(identifier);
+        if (const std::string holder = HolderOf(identifier_);
             report.code == ExitCode::NotAvailable && !holder.empty()) {
             report.message = "in use by " + holder;
             report.advice = "end that program: an instrument belongs to one process at a time";
         }
-        throw ToolFailure(report.code, identifier + ": " + report.message, report.advice);
+        throw ToolFailure(report.code, identifier_ + ": " + report.message, report.advice);
     }
-    if (opened != identifier) {
+    if (opened != identifier_) {
         throw ToolFailure(ExitCode::NoInstrument, "instruments were plugged in or out meanwhile",
                           "try again");
     }
-    session.SetInstrumentInUse(identifier);
+    session_.SetInstrumentInUse(identifier_);
 }
 
 std::string Instrument::ChipId() {
     std::array<std::uint8_t, 8> id{};
-    transport->GetChipID(id.data());
+    transport_->GetChipID(id.data());
     return HexOf(id);
 }
 
 Instrument::~Instrument() {
     // After an interruption too: closing waits for answers to what it sends.
-    session.Files().Resume();
+    session_.Files().Resume();
     try {
-        if (messageListener != nullptr) {
-            transport->RemoveListener(messageListener);
+        if (messageListener_ != nullptr) {
+            transport_->RemoveListener(messageListener_);
         }
     } catch (...) {  // closing takes the listener away as well
     }

@@ -47,21 +47,21 @@ class Instrument final {
     Instrument(const Instrument&) = delete;
     Instrument& operator=(const Instrument&) = delete;
 
-    const std::string& Identifier() const { return identifier; }
+    const std::string& Identifier() const { return identifier_; }
     /// Asks for what the chip calls itself: 16 hexadecimal digits, the same at whatever port.
     std::string ChipId();
-    CommandSet& Commands() { return *commands; }
-    const Utilities::Tools::SmartPointer<CommandSet>& SharedCommands() const { return commands; }
+    CommandSet& Commands() { return *commands_; }
+    const Utilities::Tools::SmartPointer<CommandSet>& SharedCommands() const { return commands_; }
     /// The commands at byte level, for what the command set does not offer.
-    Transport& Bytes() { return *transport; }
+    Transport& Bytes() { return *transport_; }
 
   private:
-    Session& session;
-    std::string identifier;
-    DeviceDriver::Generic::EventListener* const messageListener;
-    DeviceDriver::Ostra::LowLevel::WholeDataStages wholeData;  ///< told by the transport
-    Utilities::Tools::SmartPointer<Transport> transport;
-    Utilities::Tools::SmartPointer<CommandSet> commands;
+    Session& session_;
+    std::string identifier_;
+    DeviceDriver::Generic::EventListener* const messageListener_;
+    DeviceDriver::Ostra::LowLevel::WholeDataStages wholeData_;  ///< told by the transport
+    Utilities::Tools::SmartPointer<Transport> transport_;
+    Utilities::Tools::SmartPointer<CommandSet> commands_;
 };
 
 }  // namespace Varnholt::Cli

@@ -6,33 +6,33 @@
 
 namespace Varnholt::Cli {
 
-Interruption::Interruption() : event(Platform::MakeAutoResetEvent()) {}
+Interruption::Interruption() : event_(Platform::MakeAutoResetEvent()) {}
 
 void Interruption::Request() {
-    requested = true;
-    Platform::SignalEvent(event.Get());
-    const Platform::CriticalSection::Holder holder(section);
-    if (action && deferrals == 0) {
-        action();
+    requested_ = true;
+    Platform::SignalEvent(event_.Get());
+    const Platform::CriticalSection::Holder holder(section_);
+    if (action_ && deferrals_ == 0) {
+        action_();
     }
 }
 
 bool Interruption::Sleep(std::uint32_t milliseconds) const {
-    if (!requested && milliseconds > 0) {
-        Platform::Wait(event.Get(), milliseconds);
+    if (!requested_ && milliseconds > 0) {
+        Platform::Wait(event_.Get(), milliseconds);
     }
-    return !requested;
+    return !requested_;
 }
 
 void Interruption::ThrowIfRequested() const {
-    if (requested) {
+    if (requested_) {
         throw ToolFailure(ExitCode::Interrupted, "interrupted");
     }
 }
 
 void Interruption::SetAction(std::function<void()> whenRequested) {
-    const Platform::CriticalSection::Holder holder(section);
-    action = std::move(whenRequested);
+    const Platform::CriticalSection::Holder holder(section_);
+    action_ = std::move(whenRequested);
 }
 
 }  // namespace Varnholt::Cli

@@ -18,7 +18,7 @@ class Interruption final {
     Interruption& operator=(const Interruption&) = delete;
 
     void Request();
-    bool IsRequested() const { return requested.load(); }
+    bool IsRequested() const { return requested_.load(); }
 
     /// Waits; false at once when the end is wanted.
     bool Sleep(std::uint32_t milliseconds) const;
@@ -33,21 +33,21 @@ class Interruption final {
     /// into the EEPROM, which then looks between its steps.
     class Deferral final {
       public:
-        explicit Deferral(Interruption& deferred) : interruption(deferred) { ++interruption.deferrals; }
-        ~Deferral() { --interruption.deferrals; }
+        explicit Deferral(Interruption& deferred) : interruption_(deferred) { ++interruption_.deferrals_; }
+        ~Deferral() { --interruption_.deferrals_; }
         Deferral(const Deferral&) = delete;
         Deferral& operator=(const Deferral&) = delete;
 
       private:
-        Interruption& interruption;
+        Interruption& interruption_;
     };
 
   private:
-    std::atomic<bool> requested{false};
-    std::atomic<int> deferrals{0};
-    Platform::OwnedHandle event;
-    Platform::CriticalSection section;  ///< guards `action`
-    std::function<void()> action;
+    std::atomic<bool> requested_{false};
+    std::atomic<int> deferrals_{0};
+    Platform::OwnedHandle event_;
+    Platform::CriticalSection section_;  ///< guards `action`
+    std::function<void()> action_;
 };
 
 }  // namespace Varnholt::Cli

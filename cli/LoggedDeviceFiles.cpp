@@ -58,36 +58,36 @@ std::string TextOfFailure(Platform::ErrorCode code) {
 }  // namespace
 
 LoggedDeviceFiles::LoggedDeviceFiles(Platform::DeviceFileSystem& underlying, Log tell)
-    : below(underlying), log(std::move(tell)) {}
+    : below_(underlying), log_(std::move(tell)) {}
 
 std::vector<std::string> LoggedDeviceFiles::ListInterfaces(const Protocol::Guid& interfaceClass) {
-    return below.ListInterfaces(interfaceClass);
+    return below_.ListInterfaces(interfaceClass);
 }
 
 LoggedDeviceFiles::Handle LoggedDeviceFiles::Open(const std::string& path) {
-    const Handle file = below.Open(path);
+    const Handle file = below_.Open(path);
     const std::string interruptPipe = Native::PipeSuffix + std::to_string(Native::InterruptPipe);
     if (file != Platform::InvalidHandle() && path.ends_with(interruptPipe)) {
-        const Platform::CriticalSection::Holder holder(section);
-        interruptFiles.push_back(file);
+        const Platform::CriticalSection::Holder holder(section_);
+        interruptFiles_.push_back(file);
     }
     return file;
 }
 
 bool LoggedDeviceFiles::CloseFile(Handle file) {
     {
-        const Platform::CriticalSection::Holder holder(section);
-        std::erase(interruptFiles, file);
-        std::erase_if(running, [file](const RunningTransfer& transfer) { return transfer.file == file; });
+        const Platform::CriticalSection::Holder holder(section_);
+        std::erase(interruptFiles_, file);
+        std::erase_if(running_, [file](const RunningTransfer& transfer) { return transfer.file == file; });
     }
-    return below.CloseFile(file);
+    return below_.CloseFile(file);
 }
 
 void LoggedDeviceFiles::Tell(const Description& describe, std::uint32_t transferred, bool succeeded) {
     const Platform::ErrorCode code = Platform::LastError();
     {
-        const Platform::CriticalSection::Holder holder(section);
-        log(describe(transferred) + (succeeded ? "" : TextOfFailure(code)));
+        const Platform::CriticalSection::Holder holder(section_);
+        log_(describe(transferred) + (succeeded ? "" : TextOfFailure(code)));
     }
     Platform::SetLastError(code);
 }
@@ -97,17 +97,17 @@ bool LoggedDeviceFiles::StartTransfer(Handle file, const Overlapped& record, Des
                                       Start start) {
     {
         // Before the start: its end may be learnt of on another thread.
-        const Platform::CriticalSection::Holder holder(section);
-        std::erase_if(running,
+        const Platform::CriticalSection::Holder holder(section_);
+        std::erase_if(running_,
                       [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
-        running.push_back({&record, file, describe});
+        running_.push_back({&record, file, describe});
     }
     const bool completed = start();
     if (!completed && Platform::LastError() != Platform::Errors::IoPending) {
         Tell(describe, 0, false);
         const Platform::ErrorCode code = Platform::LastError();
-        const Platform::CriticalSection::Holder holder(section);
-        std::erase_if(running,
+        const Platform::CriticalSection::Holder holder(section_);
+        std::erase_if(running_,
                       [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
         Platform::SetLastError(code);
     }
@@ -117,15 +117,15 @@ bool LoggedDeviceFiles::StartTransfer(Handle file, const Overlapped& record, Des
 bool LoggedDeviceFiles::StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) {
     bool isInterrupt = false;
     {
-        const Platform::CriticalSection::Holder holder(section);
-        isInterrupt = std::ranges::find(interruptFiles, file) != interruptFiles.end();
+        const Platform::CriticalSection::Holder holder(section_);
+        isInterrupt = std::ranges::find(interruptFiles_, file) != interruptFiles_.end();
     }
     return StartTransfer(
         file, record,
         [isInterrupt, length](std::uint32_t transferred) {
             return fmt::format("{} {} of {}", isInterrupt ? "interrupt" : "bulk in", transferred, length);
         },
-        [&] { return below.StartRead(file, buffer, length, record); });
+        [&] { return below_.StartRead(file, buffer, length, record); });
 }
 
 bool LoggedDeviceFiles::StartWrite(Handle file, const void* buffer, std::uint32_t length,
@@ -133,7 +133,7 @@ bool LoggedDeviceFiles::StartWrite(Handle file, const void* buffer, std::uint32_
     return StartTransfer(
         file, record,
         [length](std::uint32_t transferred) { return fmt::format("bulk out {} of {}", transferred, length); },
-        [&] { return below.StartWrite(file, buffer, length, record); });
+        [&] { return below_.StartWrite(file, buffer, length, record); });
 }
 
 bool LoggedDeviceFiles::StartControl(Handle file, std::uint32_t code, const void* input,
@@ -141,11 +141,11 @@ bool LoggedDeviceFiles::StartControl(Handle file, std::uint32_t code, const void
                                      Overlapped& record) {
     const auto* const block = static_cast<const std::uint8_t*>(input);
     const auto start = [&] {
-        return below.StartControl(file, code, input, inputSize, output, outputSize, record);
+        return below_.StartControl(file, code, input, inputSize, output, outputSize, record);
     };
     if (code == UsbIo::Control::BindPipe && inputSize > 0 && *block == Protocol::InterruptInEndpoint) {
-        const Platform::CriticalSection::Holder holder(section);
-        interruptFiles.push_back(file);
+        const Platform::CriticalSection::Holder holder(section_);
+        interruptFiles_.push_back(file);
     }
     const std::optional<VendorRequest> request = VendorRequestOf(code, {block, inputSize});
     if (!request) {
@@ -162,18 +162,18 @@ bool LoggedDeviceFiles::StartControl(Handle file, std::uint32_t code, const void
 }
 
 bool LoggedDeviceFiles::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) {
-    const bool succeeded = below.GetResult(file, record, transferred, wait);
+    const bool succeeded = below_.GetResult(file, record, transferred, wait);
     const Platform::ErrorCode code = Platform::LastError();
     if (!succeeded && code == Platform::Errors::IoIncomplete) {
         return false;
     }
     Description describe;
     {
-        const Platform::CriticalSection::Holder holder(section);
-        const auto found = std::ranges::find(running, &record, &RunningTransfer::record);
-        if (found != running.end()) {
+        const Platform::CriticalSection::Holder holder(section_);
+        const auto found = std::ranges::find(running_, &record, &RunningTransfer::record);
+        if (found != running_.end()) {
             describe = std::move(found->describe);
-            running.erase(found);
+            running_.erase(found);
         }
     }
     Platform::SetLastError(code);
@@ -184,7 +184,7 @@ bool LoggedDeviceFiles::GetResult(Handle file, Overlapped& record, std::uint32_t
 }
 
 bool LoggedDeviceFiles::CancelTransfers(Handle file) {
-    return below.CancelTransfers(file);
+    return below_.CancelTransfers(file);
 }
 
 }  // namespace Varnholt::Cli

@@ -47,11 +47,11 @@ class LoggedDeviceFiles final : public Platform::DeviceFileSystem {
     bool StartTransfer(Handle file, const Overlapped& record, Description describe, Start start);
     void Tell(const Description& describe, std::uint32_t transferred, bool succeeded);
 
-    Platform::DeviceFileSystem& below;
-    const Log log;
-    Platform::CriticalSection section;  ///< guards what follows, and the log
-    std::vector<RunningTransfer> running;
-    std::vector<Handle> interruptFiles;  ///< whose reads wait for the button
+    Platform::DeviceFileSystem& below_;
+    const Log log_;
+    Platform::CriticalSection section_;  ///< guards what follows, and the log
+    std::vector<RunningTransfer> running_;
+    std::vector<Handle> interruptFiles_;  ///< whose reads wait for the button
 };
 
 }  // namespace Varnholt::Cli

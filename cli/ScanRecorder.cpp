@@ -7,57 +7,57 @@ namespace Varnholt::Cli {
 
 ScanRecorder::ScanRecorder(const ScanForm& scanForm, RecordOutput& recordOutput,
                            std::function<void(std::uint64_t bytes)> arrived)
-    : form(scanForm),
-      output(recordOutput),
-      progress(std::move(arrived)),
-      csv(scanForm.recordSize, scanForm.columns) {
-    if (form.hasHead) {
-        output.Append(csv.Head(), 0);
+    : form_(scanForm),
+      output_(recordOutput),
+      progress_(std::move(arrived)),
+      csv_(scanForm.recordSize, scanForm.columns) {
+    if (form_.hasHead) {
+        output_.Append(csv_.Head(), 0);
     }
 }
 
 void ScanRecorder::Receive(std::span<const std::uint8_t> data) {
-    if (failure != nullptr) {  // what comes now has lost its place
+    if (failure_ != nullptr) {  // what comes now has lost its place
         return;
     }
     try {
         Take(data);
     } catch (...) {
-        failure = std::current_exception();
+        failure_ = std::current_exception();
         throw;
     }
 }
 
 void ScanRecorder::Take(std::span<const std::uint8_t> data) {
-    milliseconds = time.Milliseconds();
-    received += data.size();
-    if (!begun.empty()) {
-        const auto missing = data.first(std::min(form.recordSize - begun.size(), data.size()));
-        begun.insert(begun.end(), missing.begin(), missing.end());
+    milliseconds_ = time_.Milliseconds();
+    received_ += data.size();
+    if (!begun_.empty()) {
+        const auto missing = data.first(std::min(form_.recordSize - begun_.size(), data.size()));
+        begun_.insert(begun_.end(), missing.begin(), missing.end());
         data = data.subspan(missing.size());
-        if (begun.size() < form.recordSize) {
+        if (begun_.size() < form_.recordSize) {
             return;
         }
-        PassOn(begun);
-        begun.clear();
+        PassOn(begun_);
+        begun_.clear();
     }
-    const auto whole = data.first(data.size() / form.recordSize * form.recordSize);
+    const auto whole = data.first(data.size() / form_.recordSize * form_.recordSize);
     PassOn(whole);
     data = data.subspan(whole.size());
-    begun.assign(data.begin(), data.end());
-    progress(received);
+    begun_.assign(data.begin(), data.end());
+    progress_(received_);
 }
 
 void ScanRecorder::PassOn(std::span<const std::uint8_t> records) {
-    const std::uint64_t count = records.size() / form.recordSize;
+    const std::uint64_t count = records.size() / form_.recordSize;
     if (count == 0) {
         return;
     }
-    if (form.isRaw) {
-        output.Append({reinterpret_cast<const char*>(records.data()), records.size()}, count);
+    if (form_.isRaw) {
+        output_.Append({reinterpret_cast<const char*>(records.data()), records.size()}, count);
     } else {
-        output.Append(csv.Lines(records, output.Records() + 1, milliseconds), count,
-                      RecordOutput::Form::Lines);
+        output_.Append(csv_.Lines(records, output_.Records() + 1, milliseconds_), count,
+                       RecordOutput::Form::Lines);
     }
 }
 

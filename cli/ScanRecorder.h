@@ -32,24 +32,24 @@ class ScanRecorder final : public DeviceDriver::Ostra::LowLevel::ScanReceiver {
 
     /// What ended the scan on this side, such as a failure of the output: the library passes on its text
     /// alone. Null: nothing did.
-    const std::exception_ptr& Failure() const { return failure; }
-    std::uint64_t Received() const { return received; }
+    const std::exception_ptr& Failure() const { return failure_; }
+    std::uint64_t Received() const { return received_; }
     /// Bytes behind the last whole record.
-    std::span<const std::uint8_t> LeftOver() const { return begun; }
+    std::span<const std::uint8_t> LeftOver() const { return begun_; }
 
   private:
     void Take(std::span<const std::uint8_t> data);
     void PassOn(std::span<const std::uint8_t> records);
 
-    const ScanForm form;
-    RecordOutput& output;
-    const std::function<void(std::uint64_t bytes)> progress;
-    RecordCsv csv;
-    ElapsedTime time;
-    std::uint64_t milliseconds = 0;  ///< when the transfer came
-    std::uint64_t received = 0;
-    std::exception_ptr failure;
-    std::vector<std::uint8_t> begun;  ///< a record that is not whole yet
+    const ScanForm form_;
+    RecordOutput& output_;
+    const std::function<void(std::uint64_t bytes)> progress_;
+    RecordCsv csv_;
+    ElapsedTime time_;
+    std::uint64_t milliseconds_ = 0;  ///< when the transfer came
+    std::uint64_t received_ = 0;
+    std::exception_ptr failure_;
+    std::vector<std::uint8_t> begun_;  ///< a record that is not whole yet
 };
 
 }  // namespace Varnholt::Cli

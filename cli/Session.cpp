@@ -19,41 +19,41 @@ constexpr int WidestPlot = 120;
 }  // namespace
 
 Session::Session(Surroundings& surroundings, Interruption& userInterruption)
-    : where(surroundings), interruption(userInterruption) {}
+    : where_(surroundings), interruption_(userInterruption) {}
 
 Session::~Session() {
-    interruption.SetAction({});
+    interruption_.SetAction({});
 }
 
 void Session::CarryOut() {
     if (!captureFile.empty()) {
-        recording = RecordTraffic(captureFile);
+        recording_ = RecordTraffic(captureFile);
     }
     if (verbose) {
-        loggedFiles.emplace(Platform::DeviceFiles(),
-                            [this](const std::string& line) { where.log << Name + line + '\n'; });
-        files.emplace(*loggedFiles);
+        loggedFiles_.emplace(Platform::DeviceFiles(),
+                             [this](const std::string& line) { where_.log << Name + line + '\n'; });
+        files_.emplace(*loggedFiles_);
     } else {
-        files.emplace(Platform::DeviceFiles());
+        files_.emplace(Platform::DeviceFiles());
     }
-    filesInForce.emplace(*files);
-    interruption.SetAction([this] { files->Interrupt(); });
-    interruption.ThrowIfRequested();  // one that came before
+    filesInForce_.emplace(*files_);
+    interruption_.SetAction([this] { files_->Interrupt(); });
+    interruption_.ThrowIfRequested();  // one that came before
     action();
     FlushOut();
-    if (recording) {
-        recording->Check();
+    if (recording_) {
+        recording_->Check();
     }
 }
 
 void Session::BeginRecording() {
-    if (recording) {
-        recording->Begin();
+    if (recording_) {
+        recording_->Begin();
     }
 }
 
 std::string Session::Paint(const char* color, const std::string& text) const {
-    return where.errFacts.showsColor ? "\x1b[" + std::string(color) + "m" + text + "\x1b[0m" : text;
+    return where_.errFacts.showsColor ? "\x1b[" + std::string(color) + "m" + text + "\x1b[0m" : text;
 }
 
 void Session::Print(const nlohmann::ordered_json& value) {
@@ -61,68 +61,68 @@ void Session::Print(const nlohmann::ordered_json& value) {
 }
 
 void Session::FlushOut() {
-    where.out.flush();
-    if (!where.out) {
-        interruption.ThrowIfRequested();
+    where_.out.flush();
+    if (!where_.out) {
+        interruption_.ThrowIfRequested();
         throw ToolFailure(ExitCode::File, "the output cannot be written");
     }
 }
 
 void Session::ClaimOut() {
-    if (where.outFacts.isTerminal) {
+    if (where_.outFacts.isTerminal) {
         throw ToolFailure(ExitCode::Usage, "raw bytes are no use on a terminal",
                           "write them to a file, or into a pipe");
     }
     SetStandardOutputBinary();
-    outIsClaimed = true;
+    outIsClaimed_ = true;
 }
 
 void Session::WriteClaimedOut(std::span<const std::uint8_t> content) {
-    where.out.write(reinterpret_cast<const char*>(content.data()),
-                    static_cast<std::streamsize>(content.size()));
+    where_.out.write(reinterpret_cast<const char*>(content.data()),
+                     static_cast<std::streamsize>(content.size()));
     FlushOut();
 }
 
 void Session::ClaimIn() {
-    if (inIsClaimed) {
+    if (inIsClaimed_) {
         throw ToolFailure(ExitCode::Usage, "standard input can be only one file",
                           "give the other one a name");
     }
-    inIsClaimed = true;
+    inIsClaimed_ = true;
 }
 
 void Session::Note(const std::string& text) {
-    where.err << Name << text << '\n';
+    where_.err << Name << text << '\n';
 }
 
 void Session::Warn(const std::string& text) {
-    where.err << Paint(Yellow, Name) << text << '\n';
+    where_.err << Paint(Yellow, Name) << text << '\n';
 }
 
 void Session::Report(const FailureReport& report) {
-    where.err << Paint(Red, Name) << report.message << '\n';
+    where_.err << Paint(Red, Name) << report.message << '\n';
     if (!report.advice.empty()) {
-        where.err << AdviceIndent << report.advice << '\n';
+        where_.err << AdviceIndent << report.advice << '\n';
     }
 }
 
 Progress Session::MakeProgress(const std::string& title, std::uint64_t total, const std::string& unit) {
-    StreamFacts facts = where.errFacts;
+    StreamFacts facts = where_.errFacts;
     facts.isTerminal = facts.isTerminal && !verbose;
-    return {where.err, facts, title, total, unit};
+    return {where_.err, facts, title, total, unit};
 }
 
 PlotStyle Session::StyleOfPlots() const {
     PlotStyle style;
-    style.braille = where.outFacts.showsUtf8;
-    style.width = std::min(where.outFacts.size().columns - 1, WidestPlot);
+    style.braille = where_.outFacts.showsUtf8;
+    style.width = std::min(where_.outFacts.size().columns - 1, WidestPlot);
     return style;
 }
 
 void Session::ChooseTransport(const std::string& name) {
     using DeviceDriver::Ostra::Transport;
     if (!name.empty()) {
-        chosenTransport = name == "usbio" ? Transport::UsbIo : Transport::Native;
+        chosenTransport_ = name == "usbio" ? Transport::UsbIo : Transport::Native;
     }
 }
 
@@ -135,17 +135,17 @@ FailureReport Session::Explain(const std::exception_ptr& failure) const {
         isOwn = true;
     } catch (...) {  // the library's: its text says nothing of which instrument
     }
-    if (!isOwn && interruption.IsRequested()) {
+    if (!isOwn && interruption_.IsRequested()) {
         return {ExitCode::Interrupted, "interrupted", {}};
     }
-    if (isOwn || instrumentInUse.empty()) {
+    if (isOwn || instrumentInUse_.empty()) {
         return report;
     }
-    if (report.code == ExitCode::InputOutput && !IsConnected(instrumentInUse, UsedTransport())) {
+    if (report.code == ExitCode::InputOutput && !IsConnected(instrumentInUse_, UsedTransport())) {
         report = {ExitCode::NoInstrument, "unplugged (" + report.message + ")",
                   "plug it in again; `ostra list` shows whether it is found"};
     }
-    report.message = instrumentInUse + ": " + report.message;
+    report.message = instrumentInUse_ + ": " + report.message;
     return report;
 }
 

@@ -43,8 +43,8 @@ class Session final {
     Session& operator=(const Session&) = delete;
 
     /// For results: standard output, or standard error once `ClaimOut` was called.
-    std::ostream& Out() { return outIsClaimed ? where.err : where.out; }
-    const StreamFacts& OutFacts() const { return where.outFacts; }
+    std::ostream& Out() { return outIsClaimed_ ? where_.err : where_.out; }
+    const StreamFacts& OutFacts() const { return where_.outFacts; }
     void Print(const nlohmann::ordered_json& value);
     /// What is in `Out` is on its way; throws where it cannot be written.
     void FlushOut();
@@ -55,7 +55,7 @@ class Session final {
     void WriteClaimedOut(std::span<const std::uint8_t> content);
     /// Standard input is read as a file. Throws where that has happened already.
     void ClaimIn();
-    std::uint32_t InputPatience() const { return where.inputPatience; }
+    std::uint32_t InputPatience() const { return where_.inputPatience; }
 
     /// Messages, on standard error.
     void Note(const std::string& text);
@@ -65,23 +65,23 @@ class Session final {
 
     PlotStyle StyleOfPlots() const;
 
-    Interruption& UserInterruption() { return interruption; }
+    Interruption& UserInterruption() { return interruption_; }
     /// For the action.
-    Platform::InterruptibleDeviceFiles& Files() { return *files; }
+    Platform::InterruptibleDeviceFiles& Files() { return *files_; }
     /// The recording that is asked for begins: everything is known to be right, and an instrument about to be
     /// opened.
     void BeginRecording();
 
     /// "native", "usbio", or empty: that of this host.
     void ChooseTransport(const std::string& name);
-    bool IsTransportChosen() const { return chosenTransport.has_value(); }
+    bool IsTransportChosen() const { return chosenTransport_.has_value(); }
     DeviceDriver::Ostra::Transport UsedTransport() const {
-        return chosenTransport ? *chosenTransport : DeviceDriver::Ostra::HostTransport();
+        return chosenTransport_ ? *chosenTransport_ : DeviceDriver::Ostra::HostTransport();
     }
 
     /// Sorts the failure of a command, with what is known of the instrument that it worked on.
     FailureReport Explain(const std::exception_ptr& failure) const;
-    void SetInstrumentInUse(const std::string& identifier) { instrumentInUse = identifier; }
+    void SetInstrumentInUse(const std::string& identifier) { instrumentInUse_ = identifier; }
 
     /// What the command line asks for.
     std::function<void()> action;
@@ -93,16 +93,16 @@ class Session final {
   private:
     std::string Paint(const char* color, const std::string& text) const;
 
-    Surroundings& where;
-    Interruption& interruption;
-    std::unique_ptr<TrafficRecording> recording;
-    std::optional<LoggedDeviceFiles> loggedFiles;             // stand on those of the recording
-    std::optional<Platform::InterruptibleDeviceFiles> files;  // stand on those before
-    std::optional<Platform::ScopedDeviceFiles> filesInForce;
-    std::optional<DeviceDriver::Ostra::Transport> chosenTransport;
-    std::string instrumentInUse;
-    bool outIsClaimed = false;
-    bool inIsClaimed = false;
+    Surroundings& where_;
+    Interruption& interruption_;
+    std::unique_ptr<TrafficRecording> recording_;
+    std::optional<LoggedDeviceFiles> loggedFiles_;             // stand on those of the recording
+    std::optional<Platform::InterruptibleDeviceFiles> files_;  // stand on those before
+    std::optional<Platform::ScopedDeviceFiles> filesInForce_;
+    std::optional<DeviceDriver::Ostra::Transport> chosenTransport_;
+    std::string instrumentInUse_;
+    bool outIsClaimed_ = false;
+    bool inIsClaimed_ = false;
 };
 
 }  // namespace Varnholt::Cli

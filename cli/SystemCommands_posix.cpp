@@ -19,35 +19,35 @@ namespace {
 /// The system's bus, whose devices are recorded once the recording has begun.
 class BusRecording final : public TrafficRecording, private Platform::Usb::UsbBus {
   public:
-    explicit BusRecording(const std::string& file) : name(file) {}
+    explicit BusRecording(const std::string& file) : name_(file) {}
 
     void Begin() override {
-        if (writer) {
+        if (writer_) {
             return;
         }
-        writer.emplace(name, "ostra " OSTRA_VERSION);
+        writer_.emplace(name_, "ostra " OSTRA_VERSION);
         Check();
-        recorded.emplace(bus, *writer);
+        recorded_.emplace(bus_, *writer_);
     }
     void Check() const override {
-        if (writer && writer->Failed()) {
-            throw ToolFailure(ExitCode::File, name + " cannot be written");
+        if (writer_ && writer_->Failed()) {
+            throw ToolFailure(ExitCode::File, name_ + " cannot be written");
         }
     }
 
   private:
-    std::vector<std::string> List() override { return bus.List(); }
+    std::vector<std::string> List() override { return bus_.List(); }
     std::shared_ptr<Platform::Usb::UsbDevice> Open(const std::string& device,
                                                    Platform::ErrorCode& error) override {
-        return recorded ? recorded->Open(device, error) : bus.Open(device, error);
+        return recorded_ ? recorded_->Open(device, error) : bus_.Open(device, error);
     }
 
-    const std::string name;
-    Platform::Usb::UsbBus& bus = Platform::Usb::SystemUsbBus();
-    std::optional<Platform::Usb::PcapngWriter> writer;
-    std::optional<Platform::Usb::CapturingBus> recorded;
-    const std::unique_ptr<Platform::DeviceFileSystem> files = Platform::Drivers::MakeDriverFileSystem(*this);
-    const Platform::ScopedDeviceFiles filesInForce{*files};
+    const std::string name_;
+    Platform::Usb::UsbBus& bus_ = Platform::Usb::SystemUsbBus();
+    std::optional<Platform::Usb::PcapngWriter> writer_;
+    std::optional<Platform::Usb::CapturingBus> recorded_;
+    const std::unique_ptr<Platform::DeviceFileSystem> files_ = Platform::Drivers::MakeDriverFileSystem(*this);
+    const Platform::ScopedDeviceFiles filesInForce_{*files_};
 };
 
 }  // namespace

@@ -51,7 +51,7 @@ class SignalWatch final {
 
   private:
     struct State;
-    State* state;
+    State* state_;
 };
 
 }  // namespace Varnholt::Cli

@@ -149,14 +149,14 @@ struct SignalWatch::State {
     std::thread thread;
 };
 
-SignalWatch::SignalWatch(std::function<void()> whenAsked) : state(new State(std::move(whenAsked))) {}
+SignalWatch::SignalWatch(std::function<void()> whenAsked) : state_(new State(std::move(whenAsked))) {}
 
 SignalWatch::~SignalWatch() {
-    state->ending = true;
-    ::pthread_kill(state->thread.native_handle(), SIGTERM);
-    state->thread.join();
-    ::pthread_sigmask(SIG_SETMASK, &state->maskBefore, nullptr);
-    delete state;
+    state_->ending = true;
+    ::pthread_kill(state_->thread.native_handle(), SIGTERM);
+    state_->thread.join();
+    ::pthread_sigmask(SIG_SETMASK, &state_->maskBefore, nullptr);
+    delete state_;
 }
 
 }  // namespace Varnholt::Cli

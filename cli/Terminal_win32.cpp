@@ -90,16 +90,16 @@ struct SignalWatch::State {
 };
 SignalWatch::State* SignalWatch::State::current = nullptr;
 
-SignalWatch::SignalWatch(std::function<void()> whenAsked) : state(new State) {
-    state->callback = std::move(whenAsked);
-    State::current = state;
+SignalWatch::SignalWatch(std::function<void()> whenAsked) : state_(new State) {
+    state_->callback = std::move(whenAsked);
+    State::current = state_;
     ::SetConsoleCtrlHandler(&State::Handle, TRUE);
 }
 
 SignalWatch::~SignalWatch() {
     ::SetConsoleCtrlHandler(&State::Handle, FALSE);
     State::current = nullptr;
-    delete state;
+    delete state_;
 }
 
 }  // namespace Varnholt::Cli

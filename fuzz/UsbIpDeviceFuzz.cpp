@@ -19,18 +19,18 @@ class CountedTransfer final : public Transfer, private TransferClient {
   public:
     explicit CountedTransfer(std::uint8_t usbEndpoint) {
         endpoint = usbEndpoint;
-        setup = {0xC0, 0xC9, 0, 0, static_cast<std::uint16_t>(buffer.size())};
-        data = buffer.data();
-        length = static_cast<std::uint32_t>(buffer.size());
+        setup = {0xC0, 0xC9, 0, 0, static_cast<std::uint16_t>(buffer_.size())};
+        data = buffer_.data();
+        length = static_cast<std::uint32_t>(buffer_.size());
         client = this;
     }
-    int Completions() const { return completions; }
+    int Completions() const { return completions_; }
 
   private:
-    void TransferCompleted(Transfer&) noexcept override { ++completions; }
+    void TransferCompleted(Transfer&) noexcept override { ++completions_; }
 
-    std::array<std::uint8_t, 64> buffer{};
-    std::atomic<int> completions = 0;
+    std::array<std::uint8_t, 64> buffer_{};
+    std::atomic<int> completions_ = 0;
 };
 
 }  // namespace

@@ -17,11 +17,12 @@ namespace UsbIp = Platform::Usb::UsbIp;
 
 class OneInstrument final : public UsbIpExports {
   public:
-    explicit OneInstrument(std::shared_ptr<SimulatedInstrument> exported) : instrument(std::move(exported)) {}
+    explicit OneInstrument(std::shared_ptr<SimulatedInstrument> exported)
+        : instrument_(std::move(exported)) {}
 
     std::vector<UsbIp::DeviceRecord> List() override { return {Record()}; }
     Import ImportDevice(const std::string&) override {
-        auto device = SimulatedInstrument::Connect(instrument);
+        auto device = SimulatedInstrument::Connect(instrument_);
         if (device->Claim() != Platform::Errors::Success) {
             return {UsbIp::OperationStatus::Busy, {}, nullptr};
         }
@@ -35,7 +36,7 @@ class OneInstrument final : public UsbIpExports {
         record.interfaces = 1;
         return record;
     }
-    const std::shared_ptr<SimulatedInstrument> instrument;
+    const std::shared_ptr<SimulatedInstrument> instrument_;
 };
 
 }  // namespace

@@ -16,7 +16,7 @@ class Alarm final {
   public:
     /// It may ring more often than asked for: whoever is called looks what there is to do.
     Alarm(Platform::EventScheduler& eventScheduler, std::function<void()> whenItRings)
-        : scheduler(eventScheduler), ring(std::move(whenItRings)) {}
+        : scheduler_(eventScheduler), ring_(std::move(whenItRings)) {}
     ~Alarm() { Clear(); }
     Alarm(const Alarm&) = delete;
     Alarm& operator=(const Alarm&) = delete;
@@ -34,12 +34,12 @@ class Alarm final {
 
     void Ring(std::uint64_t number);
 
-    Platform::EventScheduler& scheduler;
-    const std::function<void()> ring;
-    std::mutex mutex;  // guards what follows
-    std::vector<Setting> waiting;
-    std::uint64_t due = Never;  // of the last setting
-    std::uint64_t lastNumber = 0;
+    Platform::EventScheduler& scheduler_;
+    const std::function<void()> ring_;
+    std::mutex mutex_;  // guards what follows
+    std::vector<Setting> waiting_;
+    std::uint64_t due_ = Never;  // of the last setting
+    std::uint64_t lastNumber_ = 0;
 };
 
 }  // namespace Varnholt::Simulator

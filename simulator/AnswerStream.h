@@ -11,7 +11,7 @@ namespace Varnholt::Simulator {
 /// The bytes that the instrument has ready for its bulk IN endpoint.
 class AnswerStream final {
   public:
-    explicit AnswerStream(const SensorModel& lightSensor) : sensor(lightSensor) {}
+    explicit AnswerStream(const SensorModel& lightSensor) : sensor_(lightSensor) {}
 
     /// Readouts one after the other, `bytes` in all; ends with a transfer that does not become full.
     void StartMeasurement(const Exposure& exposure, std::uint64_t measurement, std::uint64_t bytes);
@@ -20,8 +20,8 @@ class AnswerStream final {
     void Stop();
 
     /// Something is there, if only the end of a measurement.
-    bool Active() const { return position < total || endDue; }
-    std::uint64_t Remaining() const { return total - position; }
+    bool Active() const { return position_ < total_ || endDue_; }
+    std::uint64_t Remaining() const { return total_ - position_; }
 
     /// Moves at most `length` bytes, not 0, on to `buffer`, as one transfer.
     std::uint32_t Take(std::uint8_t* buffer, std::uint32_t length);
@@ -38,14 +38,14 @@ class AnswerStream final {
 
     void MakeRecords(std::size_t bytes);
 
-    const SensorModel& sensor;
-    Exposure exposure;
-    std::uint64_t measurement = 0;
-    std::vector<std::uint8_t> content;  // memory, or the records made so far
-    bool measuring = false;
-    std::uint64_t total = 0;
-    std::uint64_t position = 0;
-    bool endDue = false;
+    const SensorModel& sensor_;
+    Exposure exposure_;
+    std::uint64_t measurement_ = 0;
+    std::vector<std::uint8_t> content_;  // memory, or the records made so far
+    bool measuring_ = false;
+    std::uint64_t total_ = 0;
+    std::uint64_t position_ = 0;
+    bool endDue_ = false;
 };
 
 }  // namespace Varnholt::Simulator

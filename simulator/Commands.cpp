@@ -22,9 +22,9 @@ Commands::Commands(const InstrumentSettings& instrumentSettings)
     : eeprom(instrumentSettings.eeprom),
       eepromFirmware(FirmwareMemory, 0xFF),
       ramFirmware(FirmwareMemory),
-      settings(instrumentSettings),
-      sensor(settings.seed, settings.light, settings.gain),
-      answers(sensor) {
+      settings_(instrumentSettings),
+      sensor_(settings_.seed, settings_.light, settings_.gain),
+      answers_(sensor_) {
     if (eeprom.empty()) {
         eeprom = FreshEeprom();
     }
@@ -32,8 +32,8 @@ Commands::Commands(const InstrumentSettings& instrumentSettings)
 }
 
 void Commands::PowerOff() {
-    answers.Stop();
-    write.Stop();
+    answers_.Stop();
+    write_.Stop();
     parameters = {};
     mode = 1;
     cpld = {};
@@ -41,11 +41,11 @@ void Commands::PowerOff() {
 }
 
 const MeasureMode& Commands::CurrentMode() const {
-    return HasModes() ? settings.modes[mode - std::size_t{1}] : OnlyModeOfOldFirmware;
+    return HasModes() ? settings_.modes[mode - std::size_t{1}] : OnlyModeOfOldFirmware;
 }
 
 bool Commands::HasModes() const {
-    return settings.firmware >= NewFirmware && !settings.modes.empty();
+    return settings_.firmware >= NewFirmware && !settings_.modes.empty();
 }
 
 Exposure Commands::NextExposure() const {
@@ -56,7 +56,7 @@ Exposure Commands::NextExposure() const {
 bool Commands::Out(const Platform::Usb::SetupPacket& setup, std::span<const std::uint8_t> data) {
     switch (static_cast<Request>(setup.request)) {
         case Request::Measure:
-            answers.StartMeasurement(NextExposure(), measurements, settings.scanBytes);
+            answers_.StartMeasurement(NextExposure(), measurements, settings_.scanBytes);
             ++measurements;
             return true;
         case Request::SetMeasureParameters:
@@ -70,7 +70,7 @@ bool Commands::Out(const Platform::Usb::SetupPacket& setup, std::span<const std:
                 return false;
             }
             // A mode that it does not have changes nothing.
-            if (HasModes() && data[0] >= 1 && data[0] <= settings.modes.size()) {
+            if (HasModes() && data[0] >= 1 && data[0] <= settings_.modes.size()) {
                 mode = data[0];
             }
             return true;
@@ -97,8 +97,8 @@ bool Commands::Out(const Platform::Usb::SetupPacket& setup, std::span<const std:
                 return false;
             }
             // Ends what is under way; what was set stays until power is lost.
-            answers.Stop();
-            write.Stop();
+            answers_.Stop();
+            write_.Stop();
             lastResetCode = data[0];
             ++resets;
             return true;
@@ -111,7 +111,7 @@ bool Commands::Out(const Platform::Usb::SetupPacket& setup, std::span<const std:
 }
 
 bool Commands::StartWrite(std::vector<std::uint8_t>& memory, std::span<const std::uint8_t> data) {
-    write.Stop();
+    write_.Stop();
     if (data.size() < 6) {
         return false;
     }
@@ -120,12 +120,12 @@ bool Commands::StartWrite(std::vector<std::uint8_t>& memory, std::span<const std
     if (address > memory.size() || length > memory.size() - address) {
         return false;
     }
-    write.Start(memory, address, length);
+    write_.Start(memory, address, length);
     return true;
 }
 
 bool Commands::StartRead(std::span<const std::uint8_t> data) {
-    answers.Stop();
+    answers_.Stop();
     if (data.size() < 6) {
         return false;
     }
@@ -135,7 +135,7 @@ bool Commands::StartRead(std::span<const std::uint8_t> data) {
         return false;
     }
     const auto first = eeprom.begin() + static_cast<std::ptrdiff_t>(address);
-    answers.StartMemory({first, first + static_cast<std::ptrdiff_t>(length)});
+    answers_.StartMemory({first, first + static_cast<std::ptrdiff_t>(length)});
     return true;
 }
 
@@ -147,12 +147,12 @@ std::optional<std::size_t> Commands::In(const Platform::Usb::SetupPacket& setup,
             StoreBig16(&answer[2], parameters.p2);
             StoreBig16(&answer[4], parameters.p3);
             answer[6] = parameters.p4;
-            answer[7] = settings.fifthParameter;
+            answer[7] = settings_.fifthParameter;
             return 8;
         case Request::GetMeasureMode: {
             const MeasureMode& current = CurrentMode();
-            const auto count = static_cast<std::uint8_t>(HasModes() ? settings.modes.size() : 1);
-            answer[0] = settings.announcedModes ? settings.announcedModes : count;
+            const auto count = static_cast<std::uint8_t>(HasModes() ? settings_.modes.size() : 1);
+            answer[0] = settings_.announcedModes ? settings_.announcedModes : count;
             answer[1] = mode;
             answer[2] = 0;
             answer[3] = current.coarseFactor;
@@ -164,14 +164,14 @@ std::optional<std::size_t> Commands::In(const Platform::Usb::SetupPacket& setup,
             StoreBig16(&answer[0], cpld[0]);
             return 2;
         case Request::GetMisc:
-            StoreBig16(&answer[0], settings.firmware);
-            StoreBig16(&answer[2], settings.misc.m4);
-            StoreBig16(&answer[4], settings.misc.m5);
-            answer[6] = settings.misc.m1;
-            answer[7] = settings.misc.m3;
+            StoreBig16(&answer[0], settings_.firmware);
+            StoreBig16(&answer[2], settings_.misc.m4);
+            StoreBig16(&answer[4], settings_.misc.m5);
+            answer[6] = settings_.misc.m1;
+            answer[7] = settings_.misc.m3;
             return 8;
         case Request::GetChipId:
-            std::ranges::copy(settings.chipId, answer.begin());
+            std::ranges::copy(settings_.chipId, answer.begin());
             return 8;
         default:
             return std::nullopt;

@@ -40,8 +40,8 @@ class Commands final {
     /// Forgets what was set and downloaded into RAM; the EEPROM stays.
     void PowerOff();
 
-    AnswerStream& Answers() { return answers; }  ///< for bulk IN
-    MemoryWrite& Write() { return write; }       ///< from bulk OUT
+    AnswerStream& Answers() { return answers_; }  ///< for bulk IN
+    MemoryWrite& Write() { return write_; }       ///< from bulk OUT
 
     // What a test looks at.
     std::vector<std::uint8_t> eeprom;
@@ -64,10 +64,10 @@ class Commands final {
     bool StartWrite(std::vector<std::uint8_t>& memory, std::span<const std::uint8_t> data);
     bool StartRead(std::span<const std::uint8_t> data);
 
-    const InstrumentSettings& settings;
-    const SensorModel sensor;
-    AnswerStream answers;
-    MemoryWrite write;
+    const InstrumentSettings& settings_;
+    const SensorModel sensor_;
+    AnswerStream answers_;
+    MemoryWrite write_;
 };
 
 }  // namespace Varnholt::Simulator

@@ -12,34 +12,34 @@ namespace Varnholt::Simulator {
 class Completions final {
   public:
     /// `inProgress` counts the transfers that were added and whose clients have not returned yet.
-    explicit Completions(std::atomic<int>& inProgress) : count(inProgress) {}
+    explicit Completions(std::atomic<int>& inProgress) : count_(inProgress) {}
     Completions(const Completions&) = delete;
     Completions& operator=(const Completions&) = delete;
 
     void Add(Platform::Usb::Transfer& transfer, Platform::Usb::TransferStatus status,
              std::uint32_t actualLength) {
-        ++count;
+        ++count_;
         transfer.status = status;
         transfer.actualLength = actualLength;
         transfer.deviceData = nullptr;
-        (last ? last->deviceData : first) = &transfer;
-        last = &transfer;
+        (last_ ? last_->deviceData : first_) = &transfer;
+        last_ = &transfer;
     }
 
     void Deliver() noexcept {
-        last = nullptr;
-        while (first) {
-            auto& transfer = *static_cast<Platform::Usb::Transfer*>(first);
-            first = std::exchange(transfer.deviceData, nullptr);
+        last_ = nullptr;
+        while (first_) {
+            auto& transfer = *static_cast<Platform::Usb::Transfer*>(first_);
+            first_ = std::exchange(transfer.deviceData, nullptr);
             transfer.client->TransferCompleted(transfer);
-            --count;
+            --count_;
         }
     }
 
   private:
-    std::atomic<int>& count;
-    void* first = nullptr;
-    Platform::Usb::Transfer* last = nullptr;
+    std::atomic<int>& count_;
+    void* first_ = nullptr;
+    Platform::Usb::Transfer* last_ = nullptr;
 };
 
 }  // namespace Varnholt::Simulator

@@ -27,28 +27,28 @@ void DataFaults::ReplaceOut(Passage& passage) {
     Bytes& data = passage.replacedData;
     data.assign(passage.data, passage.data + passage.length);
     if (passage.Has(FaultKind::Garbage)) {
-        FillWithGarbage(data.data(), data.size(), script.Hits());
+        FillWithGarbage(data.data(), data.size(), script_.Hits());
     } else if (passage.Has(FaultKind::Flip)) {
         FlipBit(data.data(), data.size(), passage.fault->argument.value_or(0));
     } else {
-        const std::lock_guard lock(mutex);
-        data = lastData[{passage.endpoint, false}];
+        const std::lock_guard lock(mutex_);
+        data = lastData_[{passage.endpoint, false}];
         data.resize(passage.length);
     }
     passage.data = data.data();
 }
 
 void DataFaults::KeepOut(const Passage& passage) {
-    if (keepsData) {
-        const std::lock_guard lock(mutex);
-        lastData[{passage.endpoint, false}].assign(passage.data, passage.data + passage.length);
+    if (keepsData_) {
+        const std::lock_guard lock(mutex_);
+        lastData_[{passage.endpoint, false}].assign(passage.data, passage.data + passage.length);
     }
 }
 
 std::optional<std::uint32_t> DataFaults::RepeatIn(Passage& passage) {
-    const std::lock_guard lock(mutex);
-    const auto last = lastData.find({passage.endpoint, true});
-    if (last == lastData.end()) {
+    const std::lock_guard lock(mutex_);
+    const auto last = lastData_.find({passage.endpoint, true});
+    if (last == lastData_.end()) {
         return std::nullopt;
     }
     const auto length =
@@ -59,14 +59,14 @@ std::optional<std::uint32_t> DataFaults::RepeatIn(Passage& passage) {
 
 void DataFaults::ChangeIn(Passage& passage) {
     if (passage.Has(FaultKind::Garbage)) {
-        FillWithGarbage(passage.data, passage.actualLength, script.Hits());
+        FillWithGarbage(passage.data, passage.actualLength, script_.Hits());
     } else if (passage.Has(FaultKind::Flip)) {
         FlipBit(passage.data, passage.actualLength, passage.fault->argument.value_or(0));
     }
-    if (keepsData) {
+    if (keepsData_) {
         try {
-            const std::lock_guard lock(mutex);
-            lastData[{passage.endpoint, true}].assign(passage.data, passage.data + passage.actualLength);
+            const std::lock_guard lock(mutex_);
+            lastData_[{passage.endpoint, true}].assign(passage.data, passage.data + passage.actualLength);
         } catch (const std::bad_alloc&) {  // older data are as stale
         }
     }

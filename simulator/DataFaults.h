@@ -18,7 +18,7 @@ class DataFaults final {
   public:
     /// The script must outlive the object.
     explicit DataFaults(const FaultScript& faultScript)
-        : script(faultScript), keepsData(script.Plan().Uses(FaultKind::Stale)) {}
+        : script_(faultScript), keepsData_(script_.Plan().Uses(FaultKind::Stale)) {}
 
     /// Gives a transfer out the wrong data in place of its own.
     void ReplaceOut(Passage& passage);
@@ -34,11 +34,11 @@ class DataFaults final {
   private:
     using Bytes = std::vector<std::uint8_t>;
 
-    const FaultScript& script;
-    const bool keepsData;
+    const FaultScript& script_;
+    const bool keepsData_;
 
-    std::mutex mutex;                                         // guards what follows
-    std::map<std::pair<std::uint8_t, bool>, Bytes> lastData;  // by endpoint, and whether it came in
+    std::mutex mutex_;                                         // guards what follows
+    std::map<std::pair<std::uint8_t, bool>, Bytes> lastData_;  // by endpoint, and whether it came in
 };
 
 }  // namespace Varnholt::Simulator

@@ -24,11 +24,11 @@ class DescriptorWriter final {
 
     DescriptorWriter& Begin(Type type) {
         EndCurrent();
-        start = bytes.size();
+        start_ = bytes_.size();
         return Byte(0).Byte(type);
     }
     DescriptorWriter& Byte(std::uint8_t value) {
-        bytes.push_back(value);
+        bytes_.push_back(value);
         return *this;
     }
     DescriptorWriter& Word(std::uint16_t value) {
@@ -36,18 +36,18 @@ class DescriptorWriter final {
     }
     std::vector<std::uint8_t> Finish() {
         EndCurrent();
-        return bytes;
+        return bytes_;
     }
 
   private:
     void EndCurrent() {
-        if (!bytes.empty()) {
-            bytes[start] = static_cast<std::uint8_t>(bytes.size() - start);
+        if (!bytes_.empty()) {
+            bytes_[start_] = static_cast<std::uint8_t>(bytes_.size() - start_);
         }
     }
 
-    std::vector<std::uint8_t> bytes;
-    std::size_t start = 0;
+    std::vector<std::uint8_t> bytes_;
+    std::size_t start_ = 0;
 };
 
 std::vector<std::uint8_t> DeviceDescriptor() {

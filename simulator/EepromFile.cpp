@@ -18,29 +18,29 @@ namespace {
 class File final {
   public:
     File(const std::string& name, int flags, mode_t mode = 0)
-        : file(open(name.c_str(), flags | O_CLOEXEC, mode)) {}
+        : file_(open(name.c_str(), flags | O_CLOEXEC, mode)) {}
     ~File() {
-        if (file >= 0) {
-            close(file);
+        if (file_ >= 0) {
+            close(file_);
         }
     }
     File(const File&) = delete;
     File& operator=(const File&) = delete;
 
-    bool IsOpen() const { return file >= 0; }
+    bool IsOpen() const { return file_ >= 0; }
     bool WriteAll(const std::vector<std::uint8_t>& bytes) const {
         for (std::size_t done = 0; done < bytes.size();) {
-            const ssize_t count = write(file, &bytes[done], bytes.size() - done);
+            const ssize_t count = write(file_, &bytes[done], bytes.size() - done);
             if (count < 0 && errno != EINTR) {
                 return false;
             }
             done += static_cast<std::size_t>(count < 0 ? 0 : count);
         }
-        return fsync(file) == 0;
+        return fsync(file_) == 0;
     }
 
   private:
-    const int file;
+    const int file_;
 };
 
 /// The error that is the reason, 0 for none.
@@ -105,49 +105,49 @@ std::vector<std::uint8_t> ReadEepromFile(const std::string& fileName) {
 }
 
 EepromFile::EepromFile(PollLoop& pollLoop, std::string name, Log logger)
-    : loop(pollLoop), fileName(std::move(name)), log(std::move(logger)) {}
+    : loop_(pollLoop), fileName_(std::move(name)), log_(std::move(logger)) {}
 
 EepromFile::~EepromFile() {
-    loop.Forget(saving);
+    loop_.Forget(saving_);
 }
 
 bool EepromFile::Exists() const {
     std::error_code error;
-    return std::filesystem::exists(fileName, error);
+    return std::filesystem::exists(fileName_, error);
 }
 
 void EepromFile::Keep(std::shared_ptr<SimulatedInstrument> kept) {
     const std::vector<std::uint8_t> content = kept->Eeprom();
-    const int error = Exists() ? TryToReplace(fileName, content) : ReplaceFile(fileName, content);
+    const int error = Exists() ? TryToReplace(fileName_, content) : ReplaceFile(fileName_, content);
     if (error != 0) {
-        throw std::runtime_error(CannotWrite(fileName, error));
+        throw std::runtime_error(CannotWrite(fileName_, error));
     }
-    instrument = std::move(kept);
+    instrument_ = std::move(kept);
 }
 
 void EepromFile::MemoryChanged() {
     // An image comes in many pieces.
     constexpr std::uint64_t delay = 100'000;
-    unsaved = true;
-    if (saving == 0) {
-        saving = loop.CallAt(loop.Now() + delay, [this] { Save(); });
+    unsaved_ = true;
+    if (saving_ == 0) {
+        saving_ = loop_.CallAt(loop_.Now() + delay, [this] { Save(); });
     }
 }
 
 bool EepromFile::Finish() {
-    if (unsaved && instrument) {
-        loop.Forget(saving);
+    if (unsaved_ && instrument_) {
+        loop_.Forget(saving_);
         Save();
     }
-    return !unsaved;
+    return !unsaved_;
 }
 
 void EepromFile::Save() {
-    saving = 0;
-    const int error = ReplaceFile(fileName, instrument->Eeprom());
-    unsaved = error != 0;
-    if (unsaved && log) {
-        log(CannotWrite(fileName, error));
+    saving_ = 0;
+    const int error = ReplaceFile(fileName_, instrument_->Eeprom());
+    unsaved_ = error != 0;
+    if (unsaved_ && log_) {
+        log_(CannotWrite(fileName_, error));
     }
 }
 

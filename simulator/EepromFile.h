@@ -37,12 +37,12 @@ class EepromFile final {
   private:
     void Save();
 
-    PollLoop& loop;
-    const std::string fileName;
-    const Log log;
-    std::shared_ptr<SimulatedInstrument> instrument;
-    Platform::EventScheduler::EventId saving = 0;
-    bool unsaved = false;
+    PollLoop& loop_;
+    const std::string fileName_;
+    const Log log_;
+    std::shared_ptr<SimulatedInstrument> instrument_;
+    Platform::EventScheduler::EventId saving_ = 0;
+    bool unsaved_ = false;
 };
 
 }  // namespace Varnholt::Simulator

@@ -43,18 +43,18 @@ class FaultInjector final : public UsbDevice, private TransferClient {
   public:
     FaultInjector(std::shared_ptr<UsbDevice> behind, std::shared_ptr<FaultScript> faultScript,
                   Platform::EventScheduler& eventScheduler, std::function<void()> unplugDevice)
-        : device(std::move(behind)),
-          script(std::move(faultScript)),
-          scheduler(eventScheduler),
-          unplug(std::move(unplugDevice)),
-          dataFaults(*script) {}
+        : device_(std::move(behind)),
+          script_(std::move(faultScript)),
+          scheduler_(eventScheduler),
+          unplug_(std::move(unplugDevice)),
+          dataFaults_(*script_) {}
     ~FaultInjector() override;
 
     std::vector<EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
-        return device->Endpoints(error);
+        return device_->Endpoints(error);
     }
-    ErrorCode Claim() override { return Gone() ? Errors::DeviceNotConnected : device->Claim(); }
-    void Release() override { device->Release(); }
+    ErrorCode Claim() override { return Gone() ? Errors::DeviceNotConnected : device_->Claim(); }
+    void Release() override { device_->Release(); }
     ErrorCode Submit(Transfer& transfer) override;
     void Cancel(Transfer& transfer) override;
     ErrorCode ClearHalt(std::uint8_t endpoint) override;
@@ -79,35 +79,35 @@ class FaultInjector final : public UsbDevice, private TransferClient {
     void End(const Passage& passage, TransferStatus status, std::uint32_t actualLength);
     bool Gone();
 
-    std::shared_ptr<UsbDevice> device;
-    const std::shared_ptr<FaultScript> script;
-    Platform::EventScheduler& scheduler;
-    const std::function<void()> unplug;
-    DataFaults dataFaults;
+    std::shared_ptr<UsbDevice> device_;
+    const std::shared_ptr<FaultScript> script_;
+    Platform::EventScheduler& scheduler_;
+    const std::function<void()> unplug_;
+    DataFaults dataFaults_;
 
-    std::mutex mutex;  // guards what follows; not held while the device, a client or the scheduler is called
-    std::map<const Transfer*, PassagePointer> passages;  // under way, by the submitter's own
-    std::map<const Passage*, EventId> alarms;
-    std::set<std::uint8_t> halted;
-    bool gone = false;
+    std::mutex mutex_;  // guards what follows; not held while the device, a client or the scheduler is called
+    std::map<const Transfer*, PassagePointer> passages_;  // under way, by the submitter's own
+    std::map<const Passage*, EventId> alarms_;
+    std::set<std::uint8_t> halted_;
+    bool gone_ = false;
 };
 
 FaultInjector::~FaultInjector() {
     std::map<const Passage*, EventId> waiting;
     {
-        const std::lock_guard lock(mutex);
-        waiting.swap(alarms);
+        const std::lock_guard lock(mutex_);
+        waiting.swap(alarms_);
     }
     for (const auto& [passage, alarm] : waiting) {
-        scheduler.Forget(alarm);
+        scheduler_.Forget(alarm);
     }
     EndAll(TransferStatus::Cancelled);
-    device.reset();  // returns when what it still had has completed
+    device_.reset();  // returns when what it still had has completed
 }
 
 bool FaultInjector::Gone() {
-    const std::lock_guard lock(mutex);
-    return gone;
+    const std::lock_guard lock(mutex_);
+    return gone_;
 }
 
 ErrorCode FaultInjector::Submit(Transfer& transfer) try {
@@ -117,17 +117,17 @@ ErrorCode FaultInjector::Submit(Transfer& transfer) try {
     passage->deviceData = nullptr;
     passage->original = &transfer;
     {
-        const std::lock_guard lock(mutex);
-        if (gone) {
+        const std::lock_guard lock(mutex_);
+        if (gone_) {
             return Errors::DeviceNotConnected;
         }
-        passages[&transfer] = passage;
+        passages_[&transfer] = passage;
         if (!IsStandardRequest(transfer)) {
-            passage->fault = script->Next(transfer.endpoint);
+            passage->fault = script_->Next(transfer.endpoint);
         }
         if (passage->Has(FaultKind::Stall) && transfer.endpoint != 0) {
-            halted.insert(transfer.endpoint);
-        } else if (halted.contains(transfer.endpoint)) {
+            halted_.insert(transfer.endpoint);
+        } else if (halted_.contains(transfer.endpoint)) {
             passage->fault = Fault{};
             passage->fault->kind = FaultKind::Stall;
         }
@@ -191,16 +191,16 @@ ErrorCode FaultInjector::Begin(const PassagePointer& passage) {
             if (passage->IsIn()) {
                 return AnswerWithLastData(passage) ? Errors::Success : PassOn(passage);
             }
-            dataFaults.ReplaceOut(*passage);
+            dataFaults_.ReplaceOut(*passage);
             return PassOn(passage);
         case FaultKind::Garbage:
         case FaultKind::Flip:
             if (!passage->IsIn()) {
-                dataFaults.ReplaceOut(*passage);
+                dataFaults_.ReplaceOut(*passage);
             }
             return PassOn(passage);
         case FaultKind::GoneBefore: {
-            const std::lock_guard lock(mutex);
+            const std::lock_guard lock(mutex_);
             passage->cancelWanted = true;  // the unplugging leaves it to the caller
         }
             UnplugDevice();
@@ -223,25 +223,25 @@ ErrorCode FaultInjector::PassOn(const PassagePointer& passage) {
     constexpr std::uint8_t standardRequestToEndpoint = 0x02;
     constexpr std::uint8_t clearFeature = 1;
     {
-        const std::lock_guard lock(mutex);
-        const auto found = passages.find(passage->original);
-        if (found == passages.end() || found->second != passage) {
+        const std::lock_guard lock(mutex_);
+        const auto found = passages_.find(passage->original);
+        if (found == passages_.end() || found->second != passage) {
             return Errors::Success;  // cancelled while it was held
         }
         passage->state = Passage::State::Submitting;
         if (!passage->IsIn()) {
-            dataFaults.KeepOut(*passage);
+            dataFaults_.KeepOut(*passage);
         }
         if (passage->endpoint == 0 && passage->setup.requestType == standardRequestToEndpoint &&
             passage->setup.request == clearFeature) {
-            halted.erase(static_cast<std::uint8_t>(passage->setup.index));
+            halted_.erase(static_cast<std::uint8_t>(passage->setup.index));
         }
     }
-    if (const ErrorCode code = device->Submit(*passage); code != Errors::Success) {
+    if (const ErrorCode code = device_->Submit(*passage); code != Errors::Success) {
         return code;
     }
     {
-        const std::lock_guard lock(mutex);
+        const std::lock_guard lock(mutex_);
         if (passage->state != Passage::State::Submitting) {
             return Errors::Success;
         }
@@ -250,13 +250,13 @@ ErrorCode FaultInjector::PassOn(const PassagePointer& passage) {
             return Errors::Success;
         }
     }
-    device->Cancel(*passage);
+    device_->Cancel(*passage);
     return Errors::Success;
 }
 
 /// False when there are none to repeat.
 bool FaultInjector::AnswerWithLastData(const PassagePointer& passage) {
-    const std::optional<std::uint32_t> length = dataFaults.RepeatIn(*passage);
+    const std::optional<std::uint32_t> length = dataFaults_.RepeatIn(*passage);
     if (!length) {
         return false;
     }
@@ -267,20 +267,20 @@ bool FaultInjector::AnswerWithLastData(const PassagePointer& passage) {
 void FaultInjector::HoldFor(const PassagePointer& passage, std::uint32_t milliseconds) {
     passage->wasHeld = true;
     {
-        const std::lock_guard lock(mutex);
-        alarms[passage.get()] = 0;  // first what can fail: no alarm is left that nobody knows
+        const std::lock_guard lock(mutex_);
+        alarms_[passage.get()] = 0;  // first what can fail: no alarm is left that nobody knows
     }
     EventId alarm = 0;
     try {
-        alarm = scheduler.CallAt(scheduler.Now() + std::uint64_t{milliseconds} * 1000,
-                                 [this, passage] { TimeHasCome(passage); });
+        alarm = scheduler_.CallAt(scheduler_.Now() + std::uint64_t{milliseconds} * 1000,
+                                  [this, passage] { TimeHasCome(passage); });
     } catch (...) {
-        const std::lock_guard lock(mutex);
-        alarms.erase(passage.get());
+        const std::lock_guard lock(mutex_);
+        alarms_.erase(passage.get());
         throw;
     }
-    const std::lock_guard lock(mutex);
-    if (const auto found = alarms.find(passage.get()); found != alarms.end()) {
+    const std::lock_guard lock(mutex_);
+    if (const auto found = alarms_.find(passage.get()); found != alarms_.end()) {
         found->second = alarm;
     }
 }
@@ -288,9 +288,9 @@ void FaultInjector::HoldFor(const PassagePointer& passage, std::uint32_t millise
 void FaultInjector::TimeHasCome(const PassagePointer& passage) noexcept {
     bool waiting = false;
     {
-        const std::lock_guard lock(mutex);
-        const auto found = passages.find(passage->original);
-        waiting = found != passages.end() && found->second == passage;
+        const std::lock_guard lock(mutex_);
+        const auto found = passages_.find(passage->original);
+        waiting = found != passages_.end() && found->second == passage;
     }
     if (waiting) {
         const ErrorCode code = GoOn(passage);
@@ -300,17 +300,17 @@ void FaultInjector::TimeHasCome(const PassagePointer& passage) noexcept {
         }
     }
     // Known as waiting until now, so that the destructor waits for the end of this call.
-    const std::lock_guard lock(mutex);
-    alarms.erase(passage.get());
+    const std::lock_guard lock(mutex_);
+    alarms_.erase(passage.get());
 }
 
 void FaultInjector::Cancel(Transfer& transfer) {
     PassagePointer passage;
     bool held = false;
     {
-        const std::lock_guard lock(mutex);
-        const auto found = passages.find(&transfer);
-        if (found == passages.end()) {
+        const std::lock_guard lock(mutex_);
+        const auto found = passages_.find(&transfer);
+        if (found == passages_.end()) {
             return;
         }
         passage = found->second;
@@ -324,19 +324,19 @@ void FaultInjector::Cancel(Transfer& transfer) {
         End(*passage, TransferStatus::Cancelled,
             passage->state == Passage::State::HeldWithData ? passage->actualLength : 0);
     } else {
-        device->Cancel(*passage);
+        device_->Cancel(*passage);
     }
 }
 
 ErrorCode FaultInjector::ClearHalt(std::uint8_t endpoint) {
     {
-        const std::lock_guard lock(mutex);
-        if (gone) {
+        const std::lock_guard lock(mutex_);
+        if (gone_) {
             return Errors::DeviceNotConnected;
         }
-        halted.erase(endpoint);
+        halted_.erase(endpoint);
     }
-    return device->ClearHalt(endpoint);
+    return device_->ClearHalt(endpoint);
 }
 
 void FaultInjector::TransferCompleted(Transfer& transfer) noexcept {
@@ -344,8 +344,8 @@ void FaultInjector::TransferCompleted(Transfer& transfer) noexcept {
     const bool unplugs = passage.Has(FaultKind::GoneDuring) || passage.Has(FaultKind::GoneAfter);
     bool held = false;
     {
-        const std::lock_guard lock(mutex);
-        held = passage.Has(FaultKind::LateCancel) && !passage.cancelWanted && !gone &&
+        const std::lock_guard lock(mutex_);
+        held = passage.Has(FaultKind::LateCancel) && !passage.cancelWanted && !gone_ &&
                passage.status == TransferStatus::Completed;
         passage.state = held ? Passage::State::HeldWithData : Passage::State::InDevice;
         if (!held) {
@@ -361,7 +361,7 @@ void FaultInjector::TransferCompleted(Transfer& transfer) noexcept {
 }
 
 void FaultInjector::ChangeOutcome(Passage& passage) {
-    if (gone || passage.Has(FaultKind::GoneDuring)) {
+    if (gone_ || passage.Has(FaultKind::GoneDuring)) {
         passage.status = TransferStatus::DeviceGone;
     } else if (passage.Has(FaultKind::LateCancel) && passage.status == TransferStatus::Completed) {
         passage.status = TransferStatus::Cancelled;
@@ -369,19 +369,19 @@ void FaultInjector::ChangeOutcome(Passage& passage) {
         passage.status = TransferStatus::Overflow;
     }
     if (passage.IsIn()) {
-        dataFaults.ChangeIn(passage);
+        dataFaults_.ChangeIn(passage);
     }
 }
 
 void FaultInjector::UnplugDevice() {
     {
-        const std::lock_guard lock(mutex);
-        if (std::exchange(gone, true)) {
+        const std::lock_guard lock(mutex_);
+        if (std::exchange(gone_, true)) {
             return;
         }
     }
-    if (unplug) {
-        unplug();
+    if (unplug_) {
+        unplug_();
     }
     EndAll(TransferStatus::DeviceGone);
 }
@@ -392,10 +392,10 @@ void FaultInjector::EndAll(TransferStatus status) {
         PassagePointer passage;
         Passage::State state{};
         {
-            const std::lock_guard lock(mutex);
+            const std::lock_guard lock(mutex_);
             const auto found = std::ranges::find_if(
-                passages, [](const auto& underWay) { return !underWay.second->cancelWanted; });
-            if (found == passages.end()) {
+                passages_, [](const auto& underWay) { return !underWay.second->cancelWanted; });
+            if (found == passages_.end()) {
                 return;
             }
             passage = found->second;
@@ -403,7 +403,7 @@ void FaultInjector::EndAll(TransferStatus status) {
             state = passage->state;
         }
         if (state == Passage::State::InDevice) {
-            device->Cancel(*passage);
+            device_->Cancel(*passage);
         } else if (state != Passage::State::Submitting) {
             const bool keepsData =
                 status == TransferStatus::Cancelled && state == Passage::State::HeldWithData;
@@ -413,13 +413,13 @@ void FaultInjector::EndAll(TransferStatus status) {
 }
 
 PassagePointer FaultInjector::TakeOut(const Passage& passage) {
-    const std::lock_guard lock(mutex);
-    const auto found = passages.find(passage.original);
-    if (found == passages.end() || found->second.get() != &passage) {
+    const std::lock_guard lock(mutex_);
+    const auto found = passages_.find(passage.original);
+    if (found == passages_.end() || found->second.get() != &passage) {
         return nullptr;
     }
     PassagePointer taken = std::move(found->second);
-    passages.erase(found);
+    passages_.erase(found);
     return taken;
 }
 

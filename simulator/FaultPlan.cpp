@@ -169,28 +169,28 @@ std::string ToText(const Fault& fault) {
 
 std::string FaultPlan::Text() const {
     std::string text;
-    for (const Fault& fault : faults) {
+    for (const Fault& fault : faults_) {
         text += (text.empty() ? "" : "; ") + ToText(fault);
     }
     return text;
 }
 
 bool FaultPlan::Uses(FaultKind kind) const {
-    return std::ranges::find(faults, kind, &Fault::kind) != faults.end();
+    return std::ranges::find(faults_, kind, &Fault::kind) != faults_.end();
 }
 
 std::optional<Fault> FaultScript::Next(std::uint8_t endpoint) {
-    const std::lock_guard lock(mutex);
+    const std::lock_guard lock(mutex_);
     const FaultScope own = ScopeOfEndpoint(endpoint);
-    const std::uint32_t inAll = counts[Place(FaultScope::All)]++;
-    const std::uint32_t inOwn = counts[Place(own)]++;
-    for (const Fault& fault : plan.Faults()) {
+    const std::uint32_t inAll = counts_[Place(FaultScope::All)]++;
+    const std::uint32_t inOwn = counts_[Place(own)]++;
+    for (const Fault& fault : plan_.Faults()) {
         if (fault.scope != FaultScope::All && fault.scope != own) {
             continue;
         }
         const std::uint32_t index = fault.scope == FaultScope::All ? inAll : inOwn;
         if (index == fault.index || (fault.fromThenOn && index > fault.index)) {
-            ++hits;
+            ++hits_;
             return fault;
         }
     }
@@ -198,13 +198,13 @@ std::optional<Fault> FaultScript::Next(std::uint8_t endpoint) {
 }
 
 std::uint32_t FaultScript::Transfers() const {
-    const std::lock_guard lock(mutex);
-    return counts[Place(FaultScope::All)];
+    const std::lock_guard lock(mutex_);
+    return counts_[Place(FaultScope::All)];
 }
 
 std::uint32_t FaultScript::Hits() const {
-    const std::lock_guard lock(mutex);
-    return hits;
+    const std::lock_guard lock(mutex_);
+    return hits_;
 }
 
 }  // namespace Varnholt::Simulator

@@ -55,19 +55,19 @@ struct Fault {
 class FaultPlan final {
   public:
     FaultPlan() = default;
-    explicit FaultPlan(std::vector<Fault> list) : faults(std::move(list)) {}
+    explicit FaultPlan(std::vector<Fault> list) : faults_(std::move(list)) {}
     /// Throws `std::invalid_argument` with a text that says what is wrong and what could stand there.
     static FaultPlan Parse(std::string_view text);
 
     /// What `Parse` reads.
     std::string Text() const;
-    const std::vector<Fault>& Faults() const { return faults; }
+    const std::vector<Fault>& Faults() const { return faults_; }
     bool Uses(FaultKind kind) const;
 
     bool operator==(const FaultPlan&) const = default;
 
   private:
-    std::vector<Fault> faults;
+    std::vector<Fault> faults_;
 };
 
 struct FaultName {
@@ -84,20 +84,20 @@ std::string ToText(const Fault& fault);
 /// thread.
 class FaultScript final {
   public:
-    explicit FaultScript(FaultPlan faultPlan) : plan(std::move(faultPlan)) {}
+    explicit FaultScript(FaultPlan faultPlan) : plan_(std::move(faultPlan)) {}
 
     /// Counts a transfer of this endpoint and says what is to go wrong with it.
     std::optional<Fault> Next(std::uint8_t endpoint);
-    const FaultPlan& Plan() const { return plan; }
+    const FaultPlan& Plan() const { return plan_; }
 
     std::uint32_t Transfers() const;  ///< counted so far
     std::uint32_t Hits() const;       ///< of them, those with a fault
 
   private:
-    const FaultPlan plan;
-    mutable std::mutex mutex;               // guards what follows
-    std::array<std::uint32_t, 5> counts{};  // by scope
-    std::uint32_t hits = 0;
+    const FaultPlan plan_;
+    mutable std::mutex mutex_;               // guards what follows
+    std::array<std::uint32_t, 5> counts_{};  // by scope
+    std::uint32_t hits_ = 0;
 };
 
 }  // namespace Varnholt::Simulator

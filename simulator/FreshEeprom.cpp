@@ -39,7 +39,7 @@ constexpr Value Calibration[] = {
 
 class Writer final {
   public:
-    explicit Writer(std::vector<std::uint8_t>& bytes) : image(bytes) {}
+    explicit Writer(std::vector<std::uint8_t>& bytes) : image_(bytes) {}
 
     void Section(std::span<const Value> values, std::uint32_t start, std::uint16_t idOffset,
                  std::uint16_t endId) {
@@ -47,27 +47,27 @@ class Writer final {
         for (const Value& value : values) {
             Entry(static_cast<std::uint16_t>(value.id + idOffset), address);
             for (std::uint32_t i = 0; i < value.words; ++i, address += 4) {
-                Protocol::StoreBig32(&image[address], value.initially);
+                Protocol::StoreBig32(&image_[address], value.initially);
             }
         }
         Entry(endId, address);
     }
 
     void Header() {
-        Protocol::StoreBig16(&image[Map::Table + Map::TableLayout::Version], Map::TableLayout::KnownVersion);
-        Protocol::StoreBig16(&image[Map::Table + Map::TableLayout::Length],
-                             static_cast<std::uint16_t>(next - Map::Table));
+        Protocol::StoreBig16(&image_[Map::Table + Map::TableLayout::Version], Map::TableLayout::KnownVersion);
+        Protocol::StoreBig16(&image_[Map::Table + Map::TableLayout::Length],
+                             static_cast<std::uint16_t>(next_ - Map::Table));
     }
 
   private:
     void Entry(std::uint16_t id, std::uint32_t address) {
-        Protocol::StoreBig16(&image[next + Map::TableLayout::EntryIdentifier], id);
-        Protocol::StoreBig32(&image[next + Map::TableLayout::EntryAddress], address);
-        next += Map::TableLayout::EntrySize;
+        Protocol::StoreBig16(&image_[next_ + Map::TableLayout::EntryIdentifier], id);
+        Protocol::StoreBig32(&image_[next_ + Map::TableLayout::EntryAddress], address);
+        next_ += Map::TableLayout::EntrySize;
     }
 
-    std::vector<std::uint8_t>& image;
-    std::uint32_t next = Map::Table + Map::TableLayout::FirstEntry;
+    std::vector<std::uint8_t>& image_;
+    std::uint32_t next_ = Map::Table + Map::TableLayout::FirstEntry;
 };
 
 }  // namespace

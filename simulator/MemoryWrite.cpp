@@ -5,32 +5,32 @@
 namespace Varnholt::Simulator {
 
 void MemoryWrite::Start(std::vector<std::uint8_t>& target, std::uint32_t address, std::uint32_t length) {
-    memory = &target;
-    next = address;
-    missing = length;
-    closingTransfersMissing = ClosingTransfers;
+    memory_ = &target;
+    next_ = address;
+    missing_ = length;
+    closingTransfersMissing_ = ClosingTransfers;
 }
 
 void MemoryWrite::Stop() {
-    memory = nullptr;
+    memory_ = nullptr;
 }
 
 MemoryWrite::Outcome MemoryWrite::Take(std::span<const std::uint8_t> data) {
-    if (missing == 0) {
-        if (--closingTransfersMissing == 0) {
+    if (missing_ == 0) {
+        if (--closingTransfersMissing_ == 0) {
             Stop();
         }
         return Outcome::Taken;
     }
-    if (data.size() > missing) {
+    if (data.size() > missing_) {
         Stop();
         return Outcome::Refused;
     }
-    const auto place = memory->begin() + static_cast<std::ptrdiff_t>(next);
+    const auto place = memory_->begin() + static_cast<std::ptrdiff_t>(next_);
     const bool changed = !std::equal(data.begin(), data.end(), place);
     std::ranges::copy(data, place);
-    next += static_cast<std::uint32_t>(data.size());
-    missing -= static_cast<std::uint32_t>(data.size());
+    next_ += static_cast<std::uint32_t>(data.size());
+    missing_ -= static_cast<std::uint32_t>(data.size());
     return changed ? Outcome::Changed : Outcome::Taken;
 }
 

@@ -15,7 +15,7 @@ class MemoryWrite final {
     void Stop();
 
     /// Data are expected; otherwise a bulk OUT transfer has to wait.
-    bool Active() const { return memory != nullptr; }
+    bool Active() const { return memory_ != nullptr; }
 
     enum class Outcome {
         Taken,
@@ -28,10 +28,10 @@ class MemoryWrite final {
   private:
     static constexpr int ClosingTransfers = 2;
 
-    std::vector<std::uint8_t>* memory = nullptr;
-    std::uint32_t next = 0;
-    std::uint32_t missing = 0;
-    int closingTransfersMissing = 0;
+    std::vector<std::uint8_t>* memory_ = nullptr;
+    std::uint32_t next_ = 0;
+    std::uint32_t missing_ = 0;
+    int closingTransfersMissing_ = 0;
 };
 
 }  // namespace Varnholt::Simulator

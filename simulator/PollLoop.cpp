@@ -15,49 +15,49 @@ std::uint64_t PollLoop::Now() {
 }
 
 PollLoop::EventId PollLoop::CallAt(std::uint64_t time, std::function<void()> event) {
-    waiting.emplace(std::pair(time, ++lastId), std::move(event));
-    return lastId;
+    waiting_.emplace(std::pair(time, ++lastId_), std::move(event));
+    return lastId_;
 }
 
 void PollLoop::Forget(EventId id) {
-    std::erase_if(waiting, [id](const auto& entry) { return entry.first.second == id; });
+    std::erase_if(waiting_, [id](const auto& entry) { return entry.first.second == id; });
 }
 
 void PollLoop::Watch(int file, short events, std::function<void()> handler) {
-    watches[file] = {events, std::make_shared<const std::function<void()>>(std::move(handler))};
+    watches_[file] = {events, std::make_shared<const std::function<void()>>(std::move(handler))};
 }
 
 void PollLoop::CallDueEvents() {
     const std::uint64_t now = Now();
-    while (!stopped && !waiting.empty() && waiting.begin()->first.first <= now) {
-        const std::function<void()> event = std::move(waiting.begin()->second);
-        waiting.erase(waiting.begin());
+    while (!stopped_ && !waiting_.empty() && waiting_.begin()->first.first <= now) {
+        const std::function<void()> event = std::move(waiting_.begin()->second);
+        waiting_.erase(waiting_.begin());
         event();
     }
 }
 
 int PollLoop::MillisecondsToNextEvent() {
     constexpr std::uint64_t longest = 3'600'000;
-    if (waiting.empty()) {
+    if (waiting_.empty()) {
         return -1;
     }
     const std::uint64_t now = Now();
-    const std::uint64_t time = waiting.begin()->first.first;
+    const std::uint64_t time = waiting_.begin()->first.first;
     return time <= now ? 0 : static_cast<int>(std::min((time - now + 999) / 1000, longest));
 }
 
 void PollLoop::Run() {
     std::vector<pollfd> files;
-    while (!stopped) {
+    while (!stopped_) {
         files.clear();
-        for (const auto& [file, watch] : watches) {
+        for (const auto& [file, watch] : watches_) {
             files.push_back({file, watch.events, 0});
         }
         poll(files.data(), files.size(), MillisecondsToNextEvent());
         CallDueEvents();
         for (const pollfd& ready : files) {
-            const auto watch = watches.find(ready.fd);
-            if (ready.revents != 0 && watch != watches.end() && !stopped) {
+            const auto watch = watches_.find(ready.fd);
+            if (ready.revents != 0 && watch != watches_.end() && !stopped_) {
                 const auto handler = watch->second.handler;
                 (*handler)();
             }

@@ -23,11 +23,11 @@ class PollLoop : public Platform::EventScheduler {
     /// Calls `handler` whenever the file is ready for one of `events` (as for poll), or broken. Replaces an
     /// earlier watch of the file.
     void Watch(int file, short events, std::function<void()> handler);
-    void Unwatch(int file) { watches.erase(file); }
+    void Unwatch(int file) { watches_.erase(file); }
 
     /// Until `Stop`.
     void Run();
-    void Stop() { stopped = true; }
+    void Stop() { stopped_ = true; }
 
   private:
     struct WatchedFile {
@@ -38,10 +38,10 @@ class PollLoop : public Platform::EventScheduler {
     void CallDueEvents();
     int MillisecondsToNextEvent();
 
-    std::map<int, WatchedFile> watches;
-    std::map<std::pair<std::uint64_t, EventId>, std::function<void()>> waiting;
-    EventId lastId = 0;
-    bool stopped = false;
+    std::map<int, WatchedFile> watches_;
+    std::map<std::pair<std::uint64_t, EventId>, std::function<void()>> waiting_;
+    EventId lastId_ = 0;
+    bool stopped_ = false;
 };
 
 }  // namespace Varnholt::Simulator

@@ -56,14 +56,14 @@ std::int64_t SquareRoot(std::uint64_t number) {
 
 }  // namespace
 
-SensorModel::SensorModel(std::uint64_t noiseSeed, double light, double gain) : seed(Mix(noiseSeed)) {
+SensorModel::SensorModel(std::uint64_t noiseSeed, double light, double gain) : seed_(Mix(noiseSeed)) {
     double highest = 0;
-    for (std::size_t i = 0; i < sensitivity.size(); ++i) {
+    for (std::size_t i = 0; i < sensitivity_.size(); ++i) {
         highest = std::max(highest, Spectrum(static_cast<double>(i)));
     }
     const double strength = std::clamp(light * gain, 0.0, 1e6) * PeakCountsPerSecond / highest;
-    for (std::size_t i = 1; i < sensitivity.size(); ++i) {
-        sensitivity[i] = static_cast<std::uint64_t>(strength * Spectrum(static_cast<double>(i)));
+    for (std::size_t i = 1; i < sensitivity_.size(); ++i) {
+        sensitivity_[i] = static_cast<std::uint64_t>(strength * Spectrum(static_cast<double>(i)));
     }
 }
 
@@ -73,10 +73,10 @@ void SensorModel::Read(const Exposure& exposure, std::uint64_t measurement, std:
     // Longer exposures saturate every pixel anyhow; the limit keeps the products in range.
     const std::uint64_t microseconds = std::min(exposure.microseconds, 1000 * second);
     const auto averages = static_cast<std::int64_t>(std::max(exposure.averages, 1U));
-    const std::uint64_t start = Mix(seed ^ Mix(measurement * 0x100000000U + record));
+    const std::uint64_t start = Mix(seed_ ^ Mix(measurement * 0x100000000U + record));
     for (std::uint32_t i = 0; i < Protocol::ReadoutValues - 1; ++i) {
         const std::uint64_t brightness =
-            std::min<std::uint64_t>(sensitivity[i] * microseconds / second, std::uint64_t{2} * FullScale);
+            std::min<std::uint64_t>(sensitivity_[i] * microseconds / second, std::uint64_t{2} * FullScale);
         const std::uint64_t dark = DarkCountsPerSecond * microseconds / second;
         const std::int64_t deviation =
             SquareRoot((ReadoutNoiseSquared + (brightness + dark) / CountsPerPhotonVariance) * 256);

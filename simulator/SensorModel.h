@@ -27,9 +27,9 @@ class SensorModel final {
     void Read(const Exposure& exposure, std::uint64_t measurement, std::uint32_t record, Record bytes) const;
 
   private:
-    const std::uint64_t seed;
+    const std::uint64_t seed_;
     /// Counts per second of each pixel.
-    std::array<std::uint64_t, Protocol::ReadoutValues> sensitivity{};
+    std::array<std::uint64_t, Protocol::ReadoutValues> sensitivity_{};
 };
 
 }  // namespace Varnholt::Simulator

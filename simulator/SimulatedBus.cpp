@@ -10,9 +10,9 @@ using Platform::Usb::UsbDevice;
 namespace Errors = Platform::Errors;
 
 std::vector<std::string> SimulatedBus::List() {
-    const std::lock_guard lock(mutex);
+    const std::lock_guard lock(mutex_);
     std::vector<std::string> names;
-    for (const auto& [name, instrument] : instruments) {
+    for (const auto& [name, instrument] : instruments_) {
         if (instrument->PluggedIn()) {
             names.push_back(name);
         }
@@ -25,14 +25,14 @@ std::shared_ptr<UsbDevice> SimulatedBus::Open(const std::string& name, Platform:
     std::shared_ptr<FaultScript> script;
     Wrapper wrap;
     {
-        const std::lock_guard lock(mutex);
-        if (const auto found = instruments.find(name); found != instruments.end()) {
+        const std::lock_guard lock(mutex_);
+        if (const auto found = instruments_.find(name); found != instruments_.end()) {
             instrument = found->second;
         }
-        if (const auto found = faults.find(name); found != faults.end()) {
+        if (const auto found = faults_.find(name); found != faults_.end()) {
             script = found->second;
         }
-        wrap = wrapper;
+        wrap = wrapper_;
     }
     if (!instrument || !instrument->PluggedIn()) {
         error = Errors::FileNotFound;
@@ -41,37 +41,37 @@ std::shared_ptr<UsbDevice> SimulatedBus::Open(const std::string& name, Platform:
     error = Errors::Success;
     std::shared_ptr<UsbDevice> device = SimulatedInstrument::Connect(instrument);
     if (script) {
-        device = InjectFaults(std::move(device), std::move(script), scheduler,
+        device = InjectFaults(std::move(device), std::move(script), scheduler_,
                               [instrument] { instrument->Unplug(); });
     }
     return wrap ? wrap(name, std::move(device)) : device;
 }
 
 SimulatedInstrument& SimulatedBus::Add(const std::string& name, InstrumentSettings settings) {
-    auto instrument = std::make_shared<SimulatedInstrument>(scheduler, std::move(settings));
-    const std::lock_guard lock(mutex);
-    return *(instruments[name] = std::move(instrument));
+    auto instrument = std::make_shared<SimulatedInstrument>(scheduler_, std::move(settings));
+    const std::lock_guard lock(mutex_);
+    return *(instruments_[name] = std::move(instrument));
 }
 
 SimulatedInstrument& SimulatedBus::Instrument(const std::string& name) {
-    const std::lock_guard lock(mutex);
-    return *instruments.at(name);
+    const std::lock_guard lock(mutex_);
+    return *instruments_.at(name);
 }
 
 std::shared_ptr<FaultScript> SimulatedBus::SetFaults(const std::string& name, FaultPlan plan) {
     auto script = std::make_shared<FaultScript>(std::move(plan));
-    const std::lock_guard lock(mutex);
+    const std::lock_guard lock(mutex_);
     if (script->Plan().Faults().empty()) {
-        faults.erase(name);
+        faults_.erase(name);
     } else {
-        faults[name] = script;
+        faults_[name] = script;
     }
     return script;
 }
 
 void SimulatedBus::WrapDevices(Wrapper devicesWrapper) {
-    const std::lock_guard lock(mutex);
-    wrapper = std::move(devicesWrapper);
+    const std::lock_guard lock(mutex_);
+    wrapper_ = std::move(devicesWrapper);
 }
 
 }  // namespace Varnholt::Simulator

@@ -18,7 +18,7 @@ namespace Varnholt::Simulator {
 class SimulatedBus final : public Platform::Usb::UsbBus {
   public:
     /// `eventScheduler` must outlive the bus and everything opened from it.
-    explicit SimulatedBus(Platform::EventScheduler& eventScheduler) : scheduler(eventScheduler) {}
+    explicit SimulatedBus(Platform::EventScheduler& eventScheduler) : scheduler_(eventScheduler) {}
 
     /// The instruments that are plugged in, ordered by name.
     std::vector<std::string> List() override;
@@ -45,11 +45,11 @@ class SimulatedBus final : public Platform::Usb::UsbBus {
     void WrapDevices(Wrapper devicesWrapper);
 
   private:
-    Platform::EventScheduler& scheduler;
-    std::mutex mutex;  // guards what follows
-    std::map<std::string, std::shared_ptr<SimulatedInstrument>> instruments;
-    std::map<std::string, std::shared_ptr<FaultScript>> faults;
-    Wrapper wrapper;
+    Platform::EventScheduler& scheduler_;
+    std::mutex mutex_;  // guards what follows
+    std::map<std::string, std::shared_ptr<SimulatedInstrument>> instruments_;
+    std::map<std::string, std::shared_ptr<FaultScript>> faults_;
+    Wrapper wrapper_;
 };
 
 }  // namespace Varnholt::Simulator

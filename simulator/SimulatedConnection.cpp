@@ -6,25 +6,25 @@ namespace Varnholt::Simulator {
 class SimulatedInstrument::Connection final : public Platform::Usb::UsbDevice {
   public:
     explicit Connection(std::shared_ptr<SimulatedInstrument> connected)
-        : instrument(std::move(connected)), attachment{instrument->Plugging()} {}
-    ~Connection() override { instrument->Drop(attachment); }
+        : instrument_(std::move(connected)), attachment_{instrument_->Plugging()} {}
+    ~Connection() override { instrument_->Drop(attachment_); }
 
     std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
-        return instrument->Endpoints(error);
+        return instrument_->Endpoints(error);
     }
-    Platform::ErrorCode Claim() override { return instrument->ClaimFor(attachment); }
-    void Release() override { instrument->ReleaseFor(attachment); }
+    Platform::ErrorCode Claim() override { return instrument_->ClaimFor(attachment_); }
+    void Release() override { instrument_->ReleaseFor(attachment_); }
     Platform::ErrorCode Submit(Platform::Usb::Transfer& transfer) override {
-        return instrument->SubmitFor(attachment, transfer);
+        return instrument_->SubmitFor(attachment_, transfer);
     }
-    void Cancel(Platform::Usb::Transfer& transfer) override { instrument->Cancel(transfer); }
+    void Cancel(Platform::Usb::Transfer& transfer) override { instrument_->Cancel(transfer); }
     Platform::ErrorCode ClearHalt(std::uint8_t endpoint) override {
-        return instrument->ClearHaltFor(attachment, endpoint);
+        return instrument_->ClearHaltFor(attachment_, endpoint);
     }
 
   private:
-    const std::shared_ptr<SimulatedInstrument> instrument;
-    const Attachment attachment;
+    const std::shared_ptr<SimulatedInstrument> instrument_;
+    const Attachment attachment_;
 };
 
 std::shared_ptr<Platform::Usb::UsbDevice> SimulatedInstrument::Connect(
@@ -33,8 +33,8 @@ std::shared_ptr<Platform::Usb::UsbDevice> SimulatedInstrument::Connect(
 }
 
 std::uint64_t SimulatedInstrument::Plugging() const {
-    const std::lock_guard lock(mutex);
-    return plugging;
+    const std::lock_guard lock(mutex_);
+    return plugging_;
 }
 
 }  // namespace Varnholt::Simulator

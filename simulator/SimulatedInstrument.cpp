@@ -33,13 +33,13 @@ std::uint64_t InMicroseconds(std::uint64_t nanoseconds) {
 
 SimulatedInstrument::SimulatedInstrument(Platform::EventScheduler& eventScheduler,
                                          InstrumentSettings instrumentSettings)
-    : settings(std::move(instrumentSettings)),
-      scheduler(eventScheduler),
-      timed(settings.bytesPerSecond != 0 || settings.takesIntegrationTime),
-      ownAttachment(),
-      commands(settings),
-      dataAlarm(scheduler, [this] { DataDue(); }),
-      buttonAlarm(scheduler, [this] { PressButton(); }) {}
+    : settings_(std::move(instrumentSettings)),
+      scheduler_(eventScheduler),
+      timed_(settings_.bytesPerSecond != 0 || settings_.takesIntegrationTime),
+      ownAttachment_(),
+      commands_(settings_),
+      dataAlarm_(scheduler_, [this] { DataDue(); }),
+      buttonAlarm_(scheduler_, [this] { PressButton(); }) {}
 
 SimulatedInstrument::~SimulatedInstrument() {
     Unplug();
@@ -48,7 +48,7 @@ SimulatedInstrument::~SimulatedInstrument() {
 
 void SimulatedInstrument::WaitForClients() const {
     // In terms of the platform, whose clock may have to let the other thread run.
-    while (completing != 0) {
+    while (completing_ != 0) {
         Platform::SleepMilliseconds(1);
     }
 }
@@ -63,46 +63,46 @@ SimulatedInstrument::Endpoint* SimulatedInstrument::FindEndpoint(std::uint8_t ad
         std::ranges::find(Simulator::Endpoints, address, &Platform::Usb::EndpointInfo::address);
     return found == Simulator::Endpoints.end()
                ? nullptr
-               : &endpoints[static_cast<std::size_t>(found - Simulator::Endpoints.begin())];
+               : &endpoints_[static_cast<std::size_t>(found - Simulator::Endpoints.begin())];
 }
 
 ErrorCode SimulatedInstrument::ClaimFor(const Attachment& attachment) {
     {
-        const std::lock_guard lock(mutex);
+        const std::lock_guard lock(mutex_);
         if (!Attached(attachment)) {
             return Errors::DeviceNotConnected;
         }
-        if (claimedBy) {
+        if (claimedBy_) {
             return Errors::Busy;
         }
-        claimedBy = &attachment;
-        configuration = ConfigurationValue;
+        claimedBy_ = &attachment;
+        configuration_ = ConfigurationValue;
     }
-    if (settings.buttonAfterMilliseconds) {
-        buttonAlarm.RingNoLaterThan(scheduler.Now() +
-                                    *settings.buttonAfterMilliseconds * MicrosecondsPerMillisecond);
+    if (settings_.buttonAfterMilliseconds) {
+        buttonAlarm_.RingNoLaterThan(scheduler_.Now() +
+                                     *settings_.buttonAfterMilliseconds * MicrosecondsPerMillisecond);
     }
     return Errors::Success;
 }
 
 void SimulatedInstrument::ReleaseFor(const Attachment& attachment) {
     {
-        const std::lock_guard lock(mutex);
-        if (claimedBy != &attachment) {
+        const std::lock_guard lock(mutex_);
+        if (claimedBy_ != &attachment) {
             return;
         }
-        claimedBy = nullptr;
+        claimedBy_ = nullptr;
     }
-    buttonAlarm.Clear();
+    buttonAlarm_.Clear();
 }
 
 ErrorCode SimulatedInstrument::SubmitFor(const Attachment& attachment, Transfer& transfer) try {
     const std::uint64_t now = TimeIfItMatters();
-    Completions done(completing);
+    Completions done(completing_);
     std::uint64_t ringAt = Never;
     bool memoryChanged = false;
     {
-        const std::lock_guard lock(mutex);
+        const std::lock_guard lock(mutex_);
         if (!Attached(attachment)) {
             return Errors::DeviceNotConnected;
         }
@@ -120,14 +120,14 @@ ErrorCode SimulatedInstrument::SubmitFor(const Attachment& attachment, Transfer&
             }
         }
         Serve(now, done);
-        ringAt = nextDataAt;
-        memoryChanged = std::exchange(eepromChanged, false);
+        ringAt = nextDataAt_;
+        memoryChanged = std::exchange(eepromChanged_, false);
     }
-    if (memoryChanged && settings.memoryChanged) {
-        settings.memoryChanged();
+    if (memoryChanged && settings_.memoryChanged) {
+        settings_.memoryChanged();
     }
     if (ringAt != Never) {
-        dataAlarm.RingNoLaterThan(InMicroseconds(ringAt));
+        dataAlarm_.RingNoLaterThan(InMicroseconds(ringAt));
     }
     done.Deliver();
     return Errors::Success;
@@ -137,17 +137,17 @@ ErrorCode SimulatedInstrument::SubmitFor(const Attachment& attachment, Transfer&
 
 void SimulatedInstrument::Cancel(Transfer& transfer) {
     const std::uint64_t now = TimeIfItMatters();
-    Completions done(completing);
+    Completions done(completing_);
     std::uint64_t ringAt = Never;
     {
-        const std::lock_guard lock(mutex);
-        for (Endpoint& endpoint : endpoints) {
+        const std::lock_guard lock(mutex_);
+        for (Endpoint& endpoint : endpoints_) {
             const auto pending = std::ranges::find(endpoint.queue, &transfer, &Pending::transfer);
             if (pending == endpoint.queue.end()) {
                 continue;
             }
             std::uint32_t moved = 0;
-            if (&endpoint == &endpoints[BulkIn] && pending == endpoint.queue.begin()) {
+            if (&endpoint == &endpoints_[BulkIn] && pending == endpoint.queue.begin()) {
                 moved = TakeWhatMoved(*pending, now);
             }
             endpoint.queue.erase(pending);
@@ -155,16 +155,16 @@ void SimulatedInstrument::Cancel(Transfer& transfer) {
             break;
         }
         Serve(now, done);
-        ringAt = nextDataAt;
+        ringAt = nextDataAt_;
     }
     if (ringAt != Never) {
-        dataAlarm.RingNoLaterThan(InMicroseconds(ringAt));
+        dataAlarm_.RingNoLaterThan(InMicroseconds(ringAt));
     }
     done.Deliver();
 }
 
 ErrorCode SimulatedInstrument::ClearHaltFor(const Attachment& attachment, std::uint8_t address) {
-    const std::lock_guard lock(mutex);
+    const std::lock_guard lock(mutex_);
     if (!Attached(attachment)) {
         return Errors::DeviceNotConnected;
     }
@@ -178,10 +178,10 @@ ErrorCode SimulatedInstrument::ClearHaltFor(const Attachment& attachment, std::u
 
 void SimulatedInstrument::Drop(const Attachment& attachment) {
     ReleaseFor(attachment);
-    Completions done(completing);
+    Completions done(completing_);
     {
-        const std::lock_guard lock(mutex);
-        for (Endpoint& endpoint : endpoints) {
+        const std::lock_guard lock(mutex_);
+        for (Endpoint& endpoint : endpoints_) {
             std::erase_if(endpoint.queue, [&](const Pending& pending) {
                 if (pending.owner == &attachment) {
                     done.Add(*pending.transfer, TransferStatus::Cancelled, 0);
@@ -195,16 +195,16 @@ void SimulatedInstrument::Drop(const Attachment& attachment) {
 }
 
 void SimulatedInstrument::Unplug() {
-    buttonAlarm.Clear();
-    Completions done(completing);
+    buttonAlarm_.Clear();
+    Completions done(completing_);
     {
-        const std::lock_guard lock(mutex);
-        pluggedIn = false;
-        claimedBy = nullptr;
-        configuration = 0;
-        buttonReportWaits = false;
-        commands.PowerOff();
-        for (Endpoint& endpoint : endpoints) {
+        const std::lock_guard lock(mutex_);
+        pluggedIn_ = false;
+        claimedBy_ = nullptr;
+        configuration_ = 0;
+        buttonReportWaits_ = false;
+        commands_.PowerOff();
+        for (Endpoint& endpoint : endpoints_) {
             endpoint.halted = false;
             for (const Pending& pending : endpoint.queue) {
                 done.Add(*pending.transfer, TransferStatus::DeviceGone, 0);
@@ -216,46 +216,46 @@ void SimulatedInstrument::Unplug() {
 }
 
 void SimulatedInstrument::PlugIn() {
-    const std::lock_guard lock(mutex);
-    if (!pluggedIn) {
-        pluggedIn = true;
-        ++plugging;
+    const std::lock_guard lock(mutex_);
+    if (!pluggedIn_) {
+        pluggedIn_ = true;
+        ++plugging_;
     }
 }
 
 bool SimulatedInstrument::PluggedIn() const {
-    const std::lock_guard lock(mutex);
-    return pluggedIn;
+    const std::lock_guard lock(mutex_);
+    return pluggedIn_;
 }
 
 bool SimulatedInstrument::Claimed() const {
-    const std::lock_guard lock(mutex);
-    return claimedBy != nullptr;
+    const std::lock_guard lock(mutex_);
+    return claimedBy_ != nullptr;
 }
 
 std::size_t SimulatedInstrument::PendingTransfers() const {
-    const std::lock_guard lock(mutex);
+    const std::lock_guard lock(mutex_);
     std::size_t count = 0;
-    for (const Endpoint& endpoint : endpoints) {
+    for (const Endpoint& endpoint : endpoints_) {
         count += endpoint.queue.size();
     }
     return count;
 }
 
 void SimulatedInstrument::PressButton() {
-    Completions done(completing);
+    Completions done(completing_);
     {
-        const std::lock_guard lock(mutex);
-        buttonReportWaits = pluggedIn;
+        const std::lock_guard lock(mutex_);
+        buttonReportWaits_ = pluggedIn_;
         ServeInterrupt(done);
     }
     done.Deliver();
 }
 
 void SimulatedInstrument::HaltEndpoint(std::uint8_t address) {
-    Completions done(completing);
+    Completions done(completing_);
     {
-        const std::lock_guard lock(mutex);
+        const std::lock_guard lock(mutex_);
         if (Endpoint* const endpoint = FindEndpoint(address)) {
             Halt(*endpoint, done);
         }
@@ -265,21 +265,21 @@ void SimulatedInstrument::HaltEndpoint(std::uint8_t address) {
 
 void SimulatedInstrument::DataDue() {
     const std::uint64_t now = TimeIfItMatters();
-    Completions done(completing);
+    Completions done(completing_);
     std::uint64_t ringAt = Never;
     {
-        const std::lock_guard lock(mutex);
+        const std::lock_guard lock(mutex_);
         Serve(now, done);
-        ringAt = nextDataAt;
+        ringAt = nextDataAt_;
     }
     if (ringAt != Never) {
-        dataAlarm.RingNoLaterThan(InMicroseconds(ringAt));
+        dataAlarm_.RingNoLaterThan(InMicroseconds(ringAt));
     }
     done.Deliver();
 }
 
 std::uint64_t SimulatedInstrument::TimeIfItMatters() {
-    return timed ? scheduler.Now() * NanosecondsPerMicrosecond : 0;
+    return timed_ ? scheduler_.Now() * NanosecondsPerMicrosecond : 0;
 }
 
 void SimulatedInstrument::Halt(Endpoint& endpoint, Completions& done) {
@@ -297,11 +297,11 @@ void SimulatedInstrument::Serve(std::uint64_t now, Completions& done) {
 }
 
 void SimulatedInstrument::ServeBulkOut(Completions& done) {
-    Endpoint& out = endpoints[BulkOut];
+    Endpoint& out = endpoints_[BulkOut];
     while (!out.queue.empty()) {
         Transfer& transfer = *out.queue.front().transfer;
         if (transfer.length > 0) {
-            MemoryWrite& write = commands.Write();
+            MemoryWrite& write = commands_.Write();
             if (!write.Active()) {
                 return;
             }
@@ -310,7 +310,7 @@ void SimulatedInstrument::ServeBulkOut(Completions& done) {
                     Halt(out, done);
                     return;
                 case MemoryWrite::Outcome::Changed:
-                    eepromChanged = true;
+                    eepromChanged_ = true;
                     break;
                 case MemoryWrite::Outcome::Taken:
                     break;
@@ -322,17 +322,17 @@ void SimulatedInstrument::ServeBulkOut(Completions& done) {
 }
 
 std::uint64_t SimulatedInstrument::Duration(std::uint64_t bytes) const {
-    return settings.bytesPerSecond == 0 ? 0 : bytes * NanosecondsPerSecond / settings.bytesPerSecond;
+    return settings_.bytesPerSecond == 0 ? 0 : bytes * NanosecondsPerSecond / settings_.bytesPerSecond;
 }
 
 std::uint64_t SimulatedInstrument::Begin(const Pending& pending) const {
-    return std::max({pending.since, answersFrom, lineFreeFrom});
+    return std::max({pending.since, answersFrom_, lineFreeFrom_});
 }
 
 void SimulatedInstrument::ServeBulkIn(std::uint64_t now, Completions& done) {
-    nextDataAt = Never;
-    AnswerStream& answers = commands.Answers();
-    Endpoint& in = endpoints[BulkIn];
+    nextDataAt_ = Never;
+    AnswerStream& answers = commands_.Answers();
+    Endpoint& in = endpoints_[BulkIn];
     while (!in.queue.empty()) {
         const Pending pending = in.queue.front();
         Transfer& transfer = *pending.transfer;
@@ -341,14 +341,14 @@ void SimulatedInstrument::ServeBulkIn(std::uint64_t now, Completions& done) {
             if (!answers.Active()) {
                 return;
             }
-            if (timed) {
+            if (timed_) {
                 const auto size = std::min<std::uint64_t>(transfer.length, answers.Remaining());
                 const std::uint64_t end = Begin(pending) + Duration(size);
                 if (end > now) {
-                    nextDataAt = end;
+                    nextDataAt_ = end;
                     return;
                 }
-                lineFreeFrom = end;
+                lineFreeFrom_ = end;
             }
             moved = answers.Take(transfer.data, transfer.length);
         }
@@ -358,26 +358,26 @@ void SimulatedInstrument::ServeBulkIn(std::uint64_t now, Completions& done) {
 }
 
 std::uint32_t SimulatedInstrument::TakeWhatMoved(const Pending& pending, std::uint64_t now) {
-    AnswerStream& answers = commands.Answers();
+    AnswerStream& answers = commands_.Answers();
     const std::uint64_t begin = Begin(pending);
     const auto size = std::min<std::uint64_t>(pending.transfer->length, answers.Remaining());
-    if (settings.bytesPerSecond == 0 || size == 0 || now <= begin) {
+    if (settings_.bytesPerSecond == 0 || size == 0 || now <= begin) {
         return 0;
     }
     const double seconds = static_cast<double>(now - begin) / static_cast<double>(NanosecondsPerSecond);
-    const double packets = seconds * static_cast<double>(settings.bytesPerSecond) / BulkPacketSize;
+    const double packets = seconds * static_cast<double>(settings_.bytesPerSecond) / BulkPacketSize;
     const std::uint64_t most = (size - 1) / BulkPacketSize;
     const auto whole = packets < static_cast<double>(most) ? static_cast<std::uint64_t>(packets) : most;
     if (whole == 0) {
         return 0;
     }
-    lineFreeFrom = now;
+    lineFreeFrom_ = now;
     return answers.Take(pending.transfer->data, static_cast<std::uint32_t>(whole * BulkPacketSize));
 }
 
 void SimulatedInstrument::ServeInterrupt(Completions& done) {
-    Endpoint& interrupt = endpoints[InterruptIn];
-    if (!buttonReportWaits || interrupt.queue.empty()) {
+    Endpoint& interrupt = endpoints_[InterruptIn];
+    if (!buttonReportWaits_ || interrupt.queue.empty()) {
         return;
     }
     Transfer& transfer = *interrupt.queue.front().transfer;
@@ -386,7 +386,7 @@ void SimulatedInstrument::ServeInterrupt(Completions& done) {
         done.Add(transfer, TransferStatus::Overflow, 0);
         return;
     }
-    buttonReportWaits = false;
+    buttonReportWaits_ = false;
     transfer.data[0] = ButtonReport;
     done.Add(transfer, TransferStatus::Completed, 1);
 }

@@ -33,14 +33,14 @@ class SimulatedInstrument final : public Platform::Usb::UsbDevice {
 
     std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override;
     /// Exclusive: `Errors::Busy` while it is claimed, also by the same caller.
-    Platform::ErrorCode Claim() override { return ClaimFor(ownAttachment); }
-    void Release() override { ReleaseFor(ownAttachment); }
+    Platform::ErrorCode Claim() override { return ClaimFor(ownAttachment_); }
+    void Release() override { ReleaseFor(ownAttachment_); }
     Platform::ErrorCode Submit(Platform::Usb::Transfer& transfer) override {
-        return SubmitFor(ownAttachment, transfer);
+        return SubmitFor(ownAttachment_, transfer);
     }
     void Cancel(Platform::Usb::Transfer& transfer) override;
     Platform::ErrorCode ClearHalt(std::uint8_t endpoint) override {
-        return ClearHaltFor(ownAttachment, endpoint);
+        return ClearHaltFor(ownAttachment_, endpoint);
     }
 
     /// The instrument as seen through one opening of it: a connection that was made before the instrument was
@@ -59,15 +59,15 @@ class SimulatedInstrument final : public Platform::Usb::UsbDevice {
     /// Looks into the instrument, or changes it, while nothing else does: `look` is called with its commands.
     template <class Function>
     auto WithCommands(Function look) {
-        const std::lock_guard lock(mutex);
-        return look(commands);
+        const std::lock_guard lock(mutex_);
+        return look(commands_);
     }
     std::vector<std::uint8_t> Eeprom();
     void SetEeprom(const std::vector<std::uint8_t>& content);
     /// Transfers that it has accepted and not completed.
     std::size_t PendingTransfers() const;
     bool Claimed() const;
-    const InstrumentSettings& Settings() const { return settings; }
+    const InstrumentSettings& Settings() const { return settings_; }
 
   private:
     class Connection;
@@ -101,7 +101,7 @@ class SimulatedInstrument final : public Platform::Usb::UsbDevice {
 
     // Called with the lock held.
     bool Attached(const Attachment& attachment) const {
-        return pluggedIn && (&attachment == &ownAttachment || attachment.plugging == plugging);
+        return pluggedIn_ && (&attachment == &ownAttachment_ || attachment.plugging == plugging_);
     }
     Endpoint* FindEndpoint(std::uint8_t address);
     void Control(Platform::Usb::Transfer& transfer, std::uint64_t now, Completions& done);
@@ -118,27 +118,27 @@ class SimulatedInstrument final : public Platform::Usb::UsbDevice {
     /// The whole packets of a transfer that is being cancelled that came before.
     std::uint32_t TakeWhatMoved(const Pending& pending, std::uint64_t now);
 
-    const InstrumentSettings settings;
-    Platform::EventScheduler& scheduler;
-    const bool timed;  // transfers take time
-    const Attachment ownAttachment;
+    const InstrumentSettings settings_;
+    Platform::EventScheduler& scheduler_;
+    const bool timed_;  // transfers take time
+    const Attachment ownAttachment_;
 
-    mutable std::mutex mutex;  // guards what follows; not held while a client or the scheduler is called
-    Commands commands;
-    std::array<Endpoint, 3> endpoints;  // as in the descriptors
-    const Attachment* claimedBy = nullptr;
-    std::uint64_t plugging = 1;
-    bool pluggedIn = true;
-    std::uint8_t configuration = 0;
-    bool buttonReportWaits = false;
-    bool eepromChanged = false;     // to be reported
-    std::uint64_t answersFrom = 0;  // nanoseconds: when the first byte of the answer can move
-    std::uint64_t lineFreeFrom = 0;
-    std::uint64_t nextDataAt = Never;
+    mutable std::mutex mutex_;  // guards what follows; not held while a client or the scheduler is called
+    Commands commands_;
+    std::array<Endpoint, 3> endpoints_;  // as in the descriptors
+    const Attachment* claimedBy_ = nullptr;
+    std::uint64_t plugging_ = 1;
+    bool pluggedIn_ = true;
+    std::uint8_t configuration_ = 0;
+    bool buttonReportWaits_ = false;
+    bool eepromChanged_ = false;     // to be reported
+    std::uint64_t answersFrom_ = 0;  // nanoseconds: when the first byte of the answer can move
+    std::uint64_t lineFreeFrom_ = 0;
+    std::uint64_t nextDataAt_ = Never;
 
-    std::atomic<int> completing = 0;  // completed transfers whose clients have not returned yet
-    Alarm dataAlarm;
-    Alarm buttonAlarm;
+    std::atomic<int> completing_ = 0;  // completed transfers whose clients have not returned yet
+    Alarm dataAlarm_;
+    Alarm buttonAlarm_;
 };
 
 }  // namespace Varnholt::Simulator

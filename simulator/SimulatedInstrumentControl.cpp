@@ -47,16 +47,16 @@ void SimulatedInstrument::Control(Transfer& transfer, std::uint64_t now, Complet
         if (standard) {
             accepted = StandardOut(setup, done);
         } else if (setup.requestType == vendorType) {
-            accepted = commands.Out(setup, {transfer.data, length});
+            accepted = commands_.Out(setup, {transfer.data, length});
         }
         if (accepted && !standard && setup.request == static_cast<std::uint8_t>(Protocol::Request::Measure)) {
-            const Exposure exposure = commands.NextExposure();
+            const Exposure exposure = commands_.NextExposure();
             constexpr std::uint64_t nanosecondsPerMicrosecond = 1000;
-            answersFrom = settings.takesIntegrationTime
-                              ? now + exposure.microseconds * exposure.averages * nanosecondsPerMicrosecond
-                              : now;
+            answersFrom_ = settings_.takesIntegrationTime
+                               ? now + exposure.microseconds * exposure.averages * nanosecondsPerMicrosecond
+                               : now;
         } else if (accepted && !standard) {
-            answersFrom = now;
+            answersFrom_ = now;
         }
         done.Add(transfer, accepted ? TransferStatus::Completed : TransferStatus::Stalled,
                  accepted ? length : 0);
@@ -70,7 +70,7 @@ void SimulatedInstrument::Control(Transfer& transfer, std::uint64_t now, Complet
         standardAnswer = StandardIn(setup);
         answer = standardAnswer;
     } else if (setup.requestType == vendorType) {
-        answer = std::span(vendorAnswer).first(commands.In(setup, vendorAnswer).value_or(0));
+        answer = std::span(vendorAnswer).first(commands_.In(setup, vendorAnswer).value_or(0));
     }
     if (answer.empty()) {
         done.Add(transfer, TransferStatus::Stalled, 0);
@@ -92,8 +92,8 @@ bool SimulatedInstrument::StandardOut(const SetupPacket& setup, Completions& don
             if (setup.value > ConfigurationValue) {
                 return false;
             }
-            configuration = static_cast<std::uint8_t>(setup.value);
-            for (Endpoint& each : endpoints) {
+            configuration_ = static_cast<std::uint8_t>(setup.value);
+            for (Endpoint& each : endpoints_) {
                 each.halted = false;
             }
             return true;
@@ -120,7 +120,7 @@ std::vector<std::uint8_t> SimulatedInstrument::StandardIn(const SetupPacket& set
     const std::uint8_t recipient = setup.requestType & RecipientMask;
     switch (setup.request) {
         case GetDescriptor:
-            return Descriptor(setup.value, settings.serial);
+            return Descriptor(setup.value, settings_.serial);
         case GetStatus:
             if (recipient == ToDevice) {
                 constexpr std::uint8_t selfPowered = 1;
@@ -134,7 +134,7 @@ std::vector<std::uint8_t> SimulatedInstrument::StandardIn(const SetupPacket& set
             }
             return {};
         case GetConfiguration:
-            return {configuration};
+            return {configuration_};
         case GetInterface:
             return {0};
         default:

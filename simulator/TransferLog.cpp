@@ -36,7 +36,7 @@ std::string Describe(const Transfer& transfer) {
 class LoggedDevice final : public Platform::Usb::InterceptingDevice {
   public:
     LoggedDevice(std::shared_ptr<UsbDevice> behind, Log tell)
-        : InterceptingDevice(std::move(behind)), log(std::move(tell)) {}
+        : InterceptingDevice(std::move(behind)), log_(std::move(tell)) {}
     ~LoggedDevice() override { Detach(); }
 
   private:
@@ -46,13 +46,13 @@ class LoggedDevice final : public Platform::Usb::InterceptingDevice {
         if (transfer.status != TransferStatus::Completed) {
             line += ": " + ToText(transfer.status);
         }
-        log(line);
+        log_(line);
     }
     void Refused(std::uint64_t, Transfer& transfer, Platform::ErrorCode code) override {
-        log(Describe(transfer) + ": refused with code " + std::to_string(code));
+        log_(Describe(transfer) + ": refused with code " + std::to_string(code));
     }
 
-    const Log log;
+    const Log log_;
 };
 
 }  // namespace

@@ -77,7 +77,7 @@ std::string RecordedTransfer::Text(std::size_t most) const {
 class TransferRecorder::Device final : public InterceptingDevice {
   public:
     Device(std::shared_ptr<UsbDevice> recorded, TransferRecorder& transferRecorder)
-        : InterceptingDevice(std::move(recorded)), recorder(transferRecorder) {}
+        : InterceptingDevice(std::move(recorded)), recorder_(transferRecorder) {}
     ~Device() override { Detach(); }
 
   private:
@@ -95,13 +95,13 @@ class TransferRecorder::Device final : public InterceptingDevice {
         if (!transfer.IsIn()) {
             recorded.data.assign(transfer.data, transfer.data + transfer.length);
         }
-        const std::lock_guard lock(recorder.mutex);
-        places[id] = {recorder.cleared, recorder.transfers.size()};
-        recorder.transfers.push_back(std::move(recorded));
+        const std::lock_guard lock(recorder_.mutex_);
+        places_[id] = {recorder_.cleared_, recorder_.transfers_.size()};
+        recorder_.transfers_.push_back(std::move(recorded));
     }
 
     void AfterCompletion(std::uint64_t id, Transfer& transfer) noexcept override {
-        const std::lock_guard lock(recorder.mutex);
+        const std::lock_guard lock(recorder_.mutex_);
         if (RecordedTransfer* const recorded = Find(id)) {
             recorded->completed = true;
             recorded->status = transfer.status;
@@ -111,24 +111,24 @@ class TransferRecorder::Device final : public InterceptingDevice {
                 recorded->data.resize(std::min<std::size_t>(recorded->data.size(), transfer.actualLength));
             }
         }
-        places.erase(id);
+        places_.erase(id);
     }
 
     void Refused(std::uint64_t id, Transfer&, Platform::ErrorCode) override {
-        const std::lock_guard lock(recorder.mutex);
+        const std::lock_guard lock(recorder_.mutex_);
         if (RecordedTransfer* const recorded = Find(id)) {
             recorded->accepted = false;
         }
-        places.erase(id);
+        places_.erase(id);
     }
 
     RecordedTransfer* Find(std::uint64_t id) {
-        const Place place = places.at(id);
-        return place.cleared == recorder.cleared ? &recorder.transfers[place.index] : nullptr;
+        const Place place = places_.at(id);
+        return place.cleared == recorder_.cleared_ ? &recorder_.transfers_[place.index] : nullptr;
     }
 
-    TransferRecorder& recorder;
-    std::map<std::uint64_t, Place> places;  // guarded by the recorder's lock
+    TransferRecorder& recorder_;
+    std::map<std::uint64_t, Place> places_;  // guarded by the recorder's lock
 };
 
 std::shared_ptr<UsbDevice> TransferRecorder::Record(std::shared_ptr<UsbDevice> device) {
@@ -146,19 +146,19 @@ std::string TransferRecorder::Text(std::size_t most) const {
 }
 
 std::vector<RecordedTransfer> TransferRecorder::Transfers() const {
-    const std::lock_guard lock(mutex);
-    return transfers;
+    const std::lock_guard lock(mutex_);
+    return transfers_;
 }
 
 std::size_t TransferRecorder::Count() const {
-    const std::lock_guard lock(mutex);
-    return transfers.size();
+    const std::lock_guard lock(mutex_);
+    return transfers_.size();
 }
 
 void TransferRecorder::Clear() {
-    const std::lock_guard lock(mutex);
-    transfers.clear();
-    ++cleared;
+    const std::lock_guard lock(mutex_);
+    transfers_.clear();
+    ++cleared_;
 }
 
 }  // namespace Varnholt::Simulator

@@ -42,9 +42,9 @@ class TransferRecorder final {
   private:
     class Device;
 
-    mutable std::mutex mutex;  // guards what follows
-    std::vector<RecordedTransfer> transfers;
-    std::size_t cleared = 0;  // changes when earlier places are no longer valid
+    mutable std::mutex mutex_;  // guards what follows
+    std::vector<RecordedTransfer> transfers_;
+    std::size_t cleared_ = 0;  // changes when earlier places are no longer valid
 };
 
 std::string ToText(Platform::Usb::TransferStatus status);

@@ -21,51 +21,51 @@ constexpr std::uint64_t Patience = 5'000'000;
 
 UsbIpConnection::UsbIpConnection(PollLoop& pollLoop, int connectedSocket,
                                  std::unique_ptr<UsbIpExports> offered, Over whenOver)
-    : loop(pollLoop), file(connectedSocket), exports(std::move(offered)), over(std::move(whenOver)) {}
+    : loop_(pollLoop), file_(connectedSocket), exports_(std::move(offered)), over_(std::move(whenOver)) {}
 
 UsbIpConnection::~UsbIpConnection() {
     StopListening();
-    session.reset();
-    exports.reset();
+    session_.reset();
+    exports_.reset();
     // The peer takes this for the sign that the instrument is free again.
-    close(file);
+    close(file_);
 }
 
 void UsbIpConnection::Begin() {
-    session = std::make_unique<UsbIpSession>(*exports, [this] { FlushSoon(); });
+    session_ = std::make_unique<UsbIpSession>(*exports_, [this] { FlushSoon(); });
     Watch();
 }
 
 void UsbIpConnection::BeginWith(std::shared_ptr<Platform::Usb::UsbDevice> device) {
-    session = std::make_unique<UsbIpSession>(std::move(device), [this] { FlushSoon(); });
+    session_ = std::make_unique<UsbIpSession>(std::move(device), [this] { FlushSoon(); });
     Watch();
 }
 
 void UsbIpConnection::Watch() {
     short events = 0;
-    if (session->WantsInput()) {
+    if (session_->WantsInput()) {
         events = static_cast<short>(events | POLLIN);
     }
-    if (!session->Output().empty()) {
+    if (!session_->Output().empty()) {
         events = static_cast<short>(events | POLLOUT);
     }
-    if (events != watchedFor) {
-        watchedFor = events;
-        loop.Watch(file, events, [this] { Ready(); });
+    if (events != watchedFor_) {
+        watchedFor_ = events;
+        loop_.Watch(file_, events, [this] { Ready(); });
     }
-    if (deadline == 0 && session->PeerIsDue()) {
-        CheckPeerAt(loop.Now() + Patience);
+    if (deadline_ == 0 && session_->PeerIsDue()) {
+        CheckPeerAt(loop_.Now() + Patience);
     }
 }
 
 void UsbIpConnection::CheckPeerAt(std::uint64_t time) {
-    deadline = loop.CallAt(time, [this] {
-        deadline = 0;
-        if (!session->PeerIsDue()) {
+    deadline_ = loop_.CallAt(time, [this] {
+        deadline_ = 0;
+        if (!session_->PeerIsDue()) {
             return;
         }
-        if (lastMoved + Patience > loop.Now()) {
-            CheckPeerAt(lastMoved + Patience);
+        if (lastMoved_ + Patience > loop_.Now()) {
+            CheckPeerAt(lastMoved_ + Patience);
             return;
         }
         End("silent for too long");
@@ -74,24 +74,24 @@ void UsbIpConnection::CheckPeerAt(std::uint64_t time) {
 
 /// Not from inside the session, which is busy.
 void UsbIpConnection::FlushSoon() {
-    if (flush == 0 && !ended) {
-        flush = loop.CallSoon([this] {
-            flush = 0;
+    if (flush_ == 0 && !ended_) {
+        flush_ = loop_.CallSoon([this] {
+            flush_ = 0;
             Flush();
         });
     }
 }
 
 void UsbIpConnection::Ready() {
-    if (session->WantsInput() && inputStart == inputEnd) {
-        const ssize_t count = recv(file, input.data(), input.size(), MSG_DONTWAIT);
+    if (session_->WantsInput() && inputStart_ == inputEnd_) {
+        const ssize_t count = recv(file_, input_.data(), input_.size(), MSG_DONTWAIT);
         if (count == 0 || (count < 0 && errno != EAGAIN && errno != EINTR)) {
             End();
             return;
         }
-        lastMoved = loop.Now();
-        inputStart = 0;
-        inputEnd = static_cast<std::size_t>(std::max<ssize_t>(count, 0));
+        lastMoved_ = loop_.Now();
+        inputStart_ = 0;
+        inputEnd_ = static_cast<std::size_t>(std::max<ssize_t>(count, 0));
     }
     Flush();
 }
@@ -99,14 +99,14 @@ void UsbIpConnection::Ready() {
 /// Lets the session have what was received, and the peer what the session has for it, as far as it goes.
 void UsbIpConnection::Flush() {
     do {
-        inputStart += session->Receive(std::span(input).subspan(inputStart, inputEnd - inputStart));
+        inputStart_ += session_->Receive(std::span(input_).subspan(inputStart_, inputEnd_ - inputStart_));
         if (!SendOutput()) {
             End();
             return;
         }
-    } while (session->WantsInput() && inputStart < inputEnd);
-    if (session->Over() && session->Output().empty()) {
-        End(session->Complaint());
+    } while (session_->WantsInput() && inputStart_ < inputEnd_);
+    if (session_->Over() && session_->Output().empty()) {
+        End(session_->Complaint());
         return;
     }
     Watch();
@@ -114,28 +114,28 @@ void UsbIpConnection::Flush() {
 
 /// False when the peer is lost.
 bool UsbIpConnection::SendOutput() {
-    while (!session->Output().empty()) {
-        const auto output = session->Output();
-        const ssize_t count = send(file, output.data(), output.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
+    while (!session_->Output().empty()) {
+        const auto output = session_->Output();
+        const ssize_t count = send(file_, output.data(), output.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
         if (count < 0 && errno != EINTR) {
             return errno == EAGAIN;
         }
-        lastMoved = loop.Now();
-        session->OutputSent(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+        lastMoved_ = loop_.Now();
+        session_->OutputSent(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
     }
     return true;
 }
 
 void UsbIpConnection::StopListening() {
-    ended = true;
-    loop.Forget(flush);
-    loop.Forget(deadline);
-    loop.Unwatch(file);
+    ended_ = true;
+    loop_.Forget(flush_);
+    loop_.Forget(deadline_);
+    loop_.Unwatch(file_);
 }
 
 void UsbIpConnection::End(const std::string& complaint) {
     StopListening();
-    over(*this, complaint);
+    over_(*this, complaint);
 }
 
 }  // namespace Varnholt::Simulator

@@ -41,20 +41,20 @@ class UsbIpConnection final {
     void StopListening();
     void End(const std::string& complaint = {});
 
-    PollLoop& loop;
-    const int file;
-    std::unique_ptr<UsbIpExports> exports;
-    const Over over;
-    std::unique_ptr<UsbIpSession> session;
+    PollLoop& loop_;
+    const int file_;
+    std::unique_ptr<UsbIpExports> exports_;
+    const Over over_;
+    std::unique_ptr<UsbIpSession> session_;
     // Received and not taken yet. Its size bounds how long one peer keeps the others waiting.
-    std::array<std::uint8_t, 65536> input{};
-    std::size_t inputStart = 0;
-    std::size_t inputEnd = 0;
-    Platform::EventScheduler::EventId flush = 0;
-    Platform::EventScheduler::EventId deadline = 0;
-    std::uint64_t lastMoved = 0;  // when bytes went either way
-    short watchedFor = -1;
-    bool ended = false;
+    std::array<std::uint8_t, 65536> input_{};
+    std::size_t inputStart_ = 0;
+    std::size_t inputEnd_ = 0;
+    Platform::EventScheduler::EventId flush_ = 0;
+    Platform::EventScheduler::EventId deadline_ = 0;
+    std::uint64_t lastMoved_ = 0;  // when bytes went either way
+    short watchedFor_ = -1;
+    bool ended_ = false;
 };
 
 }  // namespace Varnholt::Simulator

@@ -69,20 +69,20 @@ class UsbIpServer::Exports final : public UsbIpExports {
   public:
     Exports(UsbIpServer& ownServer, std::vector<Exported*> offeredInstruments, std::string peer,
             bool ownBusIds)
-        : server(ownServer),
-          offered(std::move(offeredInstruments)),
-          peerText(std::move(peer)),
-          tcp(ownBusIds) {}
+        : server_(ownServer),
+          offered_(std::move(offeredInstruments)),
+          peerText_(std::move(peer)),
+          tcp_(ownBusIds) {}
     ~Exports() override {
-        if (imported) {
-            server.Tell(imported->name + ": released by " + peerText);
-            imported->usedBy.clear();
+        if (imported_) {
+            server_.Tell(imported_->name + ": released by " + peerText_);
+            imported_->usedBy.clear();
         }
     }
 
     std::vector<UsbIp::DeviceRecord> List() override {
         std::vector<UsbIp::DeviceRecord> records;
-        for (const Exported* const each : offered) {
+        for (const Exported* const each : offered_) {
             records.push_back(each->Record(BusIdOf(*each)));
         }
         return records;
@@ -90,8 +90,8 @@ class UsbIpServer::Exports final : public UsbIpExports {
 
     Import ImportDevice(const std::string& busId) override {
         const auto found =
-            std::ranges::find_if(offered, [&](const Exported* each) { return BusIdOf(*each) == busId; });
-        if (found == offered.end()) {
+            std::ranges::find_if(offered_, [&](const Exported* each) { return BusIdOf(*each) == busId; });
+        if (found == offered_.end()) {
             return {UsbIp::OperationStatus::NoDevice, {}, nullptr};
         }
         return Take(**found);
@@ -111,50 +111,50 @@ class UsbIpServer::Exports final : public UsbIpExports {
                 instrument->PlugIn();
             };
             device = InjectFaults(std::move(device), std::make_shared<FaultScript>(wanted.faults),
-                                  server.loop, replug);
+                                  server_.loop_, replug);
         }
         if (wanted.wrap) {
             device = wanted.wrap(std::move(device));
         }
-        if (server.log) {
+        if (server_.log_) {
             device =
-                LogTransfers(std::move(device), [tell = server.log, name = wanted.name](
+                LogTransfers(std::move(device), [tell = server_.log_, name = wanted.name](
                                                     const std::string& line) { tell(name + ": " + line); });
         }
-        imported = &wanted;
-        wanted.usedBy = peerText;
-        server.Tell(wanted.name + ": opened by " + peerText);
+        imported_ = &wanted;
+        wanted.usedBy = peerText_;
+        server_.Tell(wanted.name + ": opened by " + peerText_);
         return {UsbIp::OperationStatus::Ok, wanted.Record(BusIdOf(wanted)), std::move(device)};
     }
 
   private:
     std::string BusIdOf(const Exported& each) const {
-        return tcp ? each.BusId() : Platform::Usb::SimulatorBusId;
+        return tcp_ ? each.BusId() : Platform::Usb::SimulatorBusId;
     }
 
-    UsbIpServer& server;
-    const std::vector<Exported*> offered;
-    const std::string peerText;
-    const bool tcp;
-    Exported* imported = nullptr;
+    UsbIpServer& server_;
+    const std::vector<Exported*> offered_;
+    const std::string peerText_;
+    const bool tcp_;
+    Exported* imported_ = nullptr;
 };
 
-UsbIpServer::UsbIpServer(PollLoop& pollLoop, Log logger) : loop(pollLoop), log(std::move(logger)) {}
+UsbIpServer::UsbIpServer(PollLoop& pollLoop, Log logger) : loop_(pollLoop), log_(std::move(logger)) {}
 
 UsbIpServer::~UsbIpServer() {
-    loop.Forget(cleaning);
-    loop.Forget(relistening);
-    removed.clear();
-    connections.clear();
-    for (const Listener& listener : listeners) {
-        loop.Unwatch(listener.file);
+    loop_.Forget(cleaning_);
+    loop_.Forget(relistening_);
+    removed_.clear();
+    connections_.clear();
+    for (const Listener& listener : listeners_) {
+        loop_.Unwatch(listener.file);
         close(listener.file);
     }
 }
 
 void UsbIpServer::Tell(const std::string& line) const {
-    if (log) {
-        log(line);
+    if (log_) {
+        log_(line);
     }
 }
 
@@ -171,9 +171,9 @@ void UsbIpServer::Add(Export added) {
     if (file < 0) {
         Fail("cannot listen for \"" + added.name + "\"");
     }
-    Exported& exported = exportedInstruments.emplace_back();
+    Exported& exported = exportedInstruments_.emplace_back();
     static_cast<Export&>(exported) = std::move(added);
-    exported.number = static_cast<std::uint32_t>(exportedInstruments.size());
+    exported.number = static_cast<std::uint32_t>(exportedInstruments_.size());
     ListenTo(file, {&exported}, true);
 }
 
@@ -199,7 +199,7 @@ std::uint16_t UsbIpServer::ListenTcp(std::uint16_t port) {
         Fail("cannot listen on TCP port " + std::to_string(port));
     }
     std::vector<Exported*> all;
-    for (Exported& each : exportedInstruments) {
+    for (Exported& each : exportedInstruments_) {
         all.push_back(&each);
     }
     ListenTo(file, std::move(all), false);
@@ -207,8 +207,8 @@ std::uint16_t UsbIpServer::ListenTcp(std::uint16_t port) {
 }
 
 UsbIpServer::Exported& UsbIpServer::Find(const std::string& name) {
-    const auto found = std::ranges::find(exportedInstruments, name, &Exported::name);
-    if (found == exportedInstruments.end()) {
+    const auto found = std::ranges::find(exportedInstruments_, name, &Exported::name);
+    if (found == exportedInstruments_.end()) {
         throw std::runtime_error("no instrument named \"" + name + "\"");
     }
     return *found;
@@ -221,23 +221,23 @@ UsbIp::DeviceRecord UsbIpServer::Record(const std::string& name) {
 
 void UsbIpServer::ListenTo(int file, std::vector<Exported*> offered, bool unixSocket) {
     fcntl(file, F_SETFL, O_NONBLOCK);
-    listeners.push_back({file, unixSocket, std::move(offered)});
+    listeners_.push_back({file, unixSocket, std::move(offered)});
     Listen();
 }
 
 void UsbIpServer::Listen() {
-    for (const Listener& listener : listeners) {
-        loop.Watch(listener.file, POLLIN, [this, &listener] { Accept(listener); });
+    for (const Listener& listener : listeners_) {
+        loop_.Watch(listener.file, POLLIN, [this, &listener] { Accept(listener); });
     }
 }
 
 void UsbIpServer::PauseListening() {
     constexpr std::uint64_t pause = 100'000;
-    for (const Listener& listener : listeners) {
-        loop.Unwatch(listener.file);
+    for (const Listener& listener : listeners_) {
+        loop_.Unwatch(listener.file);
     }
-    loop.Forget(relistening);
-    relistening = loop.CallAt(loop.Now() + pause, [this] { Listen(); });
+    loop_.Forget(relistening_);
+    relistening_ = loop_.CallAt(loop_.Now() + pause, [this] { Listen(); });
 }
 
 void UsbIpServer::Accept(const Listener& listener) {
@@ -262,7 +262,7 @@ void UsbIpServer::Accept(const Listener& listener) {
         const int on = 1;
         setsockopt(file, IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
     }
-    if (connections.size() >= mostConnections) {
+    if (connections_.size() >= mostConnections) {
         close(file);
         return;
     }
@@ -288,17 +288,18 @@ UsbIpConnection& UsbIpServer::Connect(int file, std::unique_ptr<Exports> exports
         }
         Remove(connection);
     };
-    return *connections.emplace_back(std::make_unique<UsbIpConnection>(loop, file, std::move(exports), over));
+    return *connections_.emplace_back(
+        std::make_unique<UsbIpConnection>(loop_, file, std::move(exports), over));
 }
 
 void UsbIpServer::Remove(UsbIpConnection& connection) {
     const auto found =
-        std::ranges::find_if(connections, [&](const auto& each) { return each.get() == &connection; });
-    removed.splice(removed.end(), connections, found);
-    if (cleaning == 0) {
-        cleaning = loop.CallSoon([this] {
-            cleaning = 0;
-            removed.clear();
+        std::ranges::find_if(connections_, [&](const auto& each) { return each.get() == &connection; });
+    removed_.splice(removed_.end(), connections_, found);
+    if (cleaning_ == 0) {
+        cleaning_ = loop_.CallSoon([this] {
+            cleaning_ = 0;
+            removed_.clear();
         });
     }
 }

@@ -68,14 +68,14 @@ class UsbIpServer final {
     void Remove(UsbIpConnection& connection);
     void Tell(const std::string& line) const;
 
-    PollLoop& loop;
-    const Log log;
-    std::list<Exported> exportedInstruments;
-    std::list<Listener> listeners;
-    std::list<std::unique_ptr<UsbIpConnection>> connections;
-    std::list<std::unique_ptr<UsbIpConnection>> removed;
-    Platform::EventScheduler::EventId cleaning = 0;
-    Platform::EventScheduler::EventId relistening = 0;
+    PollLoop& loop_;
+    const Log log_;
+    std::list<Exported> exportedInstruments_;
+    std::list<Listener> listeners_;
+    std::list<std::unique_ptr<UsbIpConnection>> connections_;
+    std::list<std::unique_ptr<UsbIpConnection>> removed_;
+    Platform::EventScheduler::EventId cleaning_ = 0;
+    Platform::EventScheduler::EventId relistening_ = 0;
 };
 
 }  // namespace Varnholt::Simulator

@@ -22,64 +22,64 @@ struct UsbIpSession::Urb : Transfer {
 };
 
 UsbIpSession::UsbIpSession(UsbIpExports& exportedDevices, std::function<void()> outputReady)
-    : exports(&exportedDevices), notify(std::move(outputReady)) {
+    : exports_(&exportedDevices), notify_(std::move(outputReady)) {
     Expect(&UsbIpSession::HandleOperation, UsbIp::OperationHeaderSize);
 }
 
 UsbIpSession::UsbIpSession(std::shared_ptr<UsbDevice> importedDevice, std::function<void()> outputReady)
-    : exports(nullptr), notify(std::move(outputReady)), device(std::move(importedDevice)) {
+    : exports_(nullptr), notify_(std::move(outputReady)), device_(std::move(importedDevice)) {
     Expect(&UsbIpSession::HandlePacketHeader, UsbIp::PacketHeaderSize);
 }
 
 UsbIpSession::~UsbIpSession() {
-    over = true;
-    device.reset();  // ends what is still under way
+    over_ = true;
+    device_.reset();  // ends what is still under way
 }
 
 void UsbIpSession::Expect(void (UsbIpSession::*handler)(), std::size_t bytes) {
-    input.clear();
-    expected = bytes;
-    next = handler;
+    input_.clear();
+    expected_ = bytes;
+    next_ = handler;
 }
 
 std::size_t UsbIpSession::Receive(std::span<const std::uint8_t> bytes) {
     const std::size_t offered = bytes.size();
     while (!bytes.empty() && WantsInput()) {
-        const std::size_t count = std::min(bytes.size(), expected - input.size());
-        input.insert(input.end(), bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(count));
+        const std::size_t count = std::min(bytes.size(), expected_ - input_.size());
+        input_.insert(input_.end(), bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(count));
         bytes = bytes.subspan(count);
-        if (input.size() == expected) {
-            (this->*next)();
+        if (input_.size() == expected_) {
+            (this->*next_)();
         }
     }
     return offered - bytes.size();
 }
 
 void UsbIpSession::OutputSent(std::size_t count) {
-    sent += count;
-    if (sent == output.size()) {
-        output.clear();
-        sent = 0;
+    sent_ += count;
+    if (sent_ == output_.size()) {
+        output_.clear();
+        sent_ = 0;
     }
 }
 
 void UsbIpSession::Send(std::span<const std::uint8_t> bytes) {
-    if (sent > MostOutput) {
-        output.erase(output.begin(), output.begin() + static_cast<std::ptrdiff_t>(sent));
-        sent = 0;
+    if (sent_ > MostOutput) {
+        output_.erase(output_.begin(), output_.begin() + static_cast<std::ptrdiff_t>(sent_));
+        sent_ = 0;
     }
-    output.insert(output.end(), bytes.begin(), bytes.end());
+    output_.insert(output_.end(), bytes.begin(), bytes.end());
 }
 
 void UsbIpSession::End(const std::string& reason) {
-    if (!std::exchange(over, true)) {
-        complaint = reason;
+    if (!std::exchange(over_, true)) {
+        complaint_ = reason;
     }
-    notify();
+    notify_();
 }
 
 void UsbIpSession::HandleOperation() {
-    const auto header = UsbIp::DecodeOperation(std::span(input).first<UsbIp::OperationHeaderSize>());
+    const auto header = UsbIp::DecodeOperation(std::span(input_).first<UsbIp::OperationHeaderSize>());
     if (header.version != UsbIp::ProtocolVersion) {
         End("not USB/IP, or another version of it");
     } else if (header.operation == UsbIp::Operation::ListRequest) {
@@ -93,7 +93,7 @@ void UsbIpSession::HandleOperation() {
 }
 
 void UsbIpSession::SendDeviceList() {
-    const std::vector<UsbIp::DeviceRecord> records = exports->List();
+    const std::vector<UsbIp::DeviceRecord> records = exports_->List();
     UsbIp::OperationHeader header;
     header.operation = UsbIp::Operation::ListReply;
     Send(UsbIp::Encode(header));
@@ -110,8 +110,8 @@ void UsbIpSession::SendDeviceList() {
 }
 
 void UsbIpSession::HandleImport() {
-    const std::string busId = UsbIp::DecodeBusId(std::span(input).first<UsbIp::BusIdSize>());
-    UsbIpExports::Import import = exports->ImportDevice(busId);
+    const std::string busId = UsbIp::DecodeBusId(std::span(input_).first<UsbIp::BusIdSize>());
+    UsbIpExports::Import import = exports_->ImportDevice(busId);
     UsbIp::OperationHeader header;
     header.operation = UsbIp::Operation::ImportReply;
     header.status = import.status;
@@ -121,22 +121,22 @@ void UsbIpSession::HandleImport() {
         return;
     }
     Send(UsbIp::Encode(import.record));
-    device = std::move(import.device);
+    device_ = std::move(import.device);
     Expect(&UsbIpSession::HandlePacketHeader, UsbIp::PacketHeaderSize);
-    notify();
+    notify_();
 }
 
 void UsbIpSession::HandlePacketHeader() {
-    const auto packet = UsbIp::DecodePacket(std::span(input).first<UsbIp::PacketHeaderSize>());
+    const auto packet = UsbIp::DecodePacket(std::span(input_).first<UsbIp::PacketHeaderSize>());
     if (packet && std::holds_alternative<UsbIp::UnlinkPacket>(*packet)) {
         Expect(&UsbIpSession::HandlePacketHeader, UsbIp::PacketHeaderSize);
         Unlink(std::get<UsbIp::UnlinkPacket>(*packet));
     } else if (packet && std::holds_alternative<UsbIp::SubmitPacket>(*packet)) {
-        submit = std::get<UsbIp::SubmitPacket>(*packet);
-        if (!submit.in && submit.length > 0) {
-            Expect(&UsbIpSession::SubmitPacket, submit.length);
+        submit_ = std::get<UsbIp::SubmitPacket>(*packet);
+        if (!submit_.in && submit_.length > 0) {
+            Expect(&UsbIpSession::SubmitPacket, submit_.length);
         } else {
-            input.clear();
+            input_.clear();
             SubmitPacket();
         }
     } else {
@@ -145,27 +145,27 @@ void UsbIpSession::HandlePacketHeader() {
 }
 
 void UsbIpSession::SubmitPacket() {
-    if (urbs.contains(submit.sequence) || urbs.size() >= MostTransfers ||
-        pendingBytes + submit.length > MostPendingBytes) {
+    if (urbs_.contains(submit_.sequence) || urbs_.size() >= MostTransfers ||
+        pendingBytes_ + submit_.length > MostPendingBytes) {
         End("too many transfers, or two with one number");
         return;
     }
     auto owned = std::make_unique<Urb>();
     Urb& urb = *owned;
-    urb.sequence = submit.sequence;
-    urb.sendsData = submit.in;
-    urb.buffer = std::exchange(input, {});
-    urb.buffer.resize(submit.length);
-    urb.endpoint = submit.endpoint;
-    urb.setup = submit.setup;
+    urb.sequence = submit_.sequence;
+    urb.sendsData = submit_.in;
+    urb.buffer = std::exchange(input_, {});
+    urb.buffer.resize(submit_.length);
+    urb.endpoint = submit_.endpoint;
+    urb.setup = submit_.setup;
     urb.data = urb.buffer.data();
-    urb.length = submit.length;
+    urb.length = submit_.length;
     urb.client = this;
     Expect(&UsbIpSession::HandlePacketHeader, UsbIp::PacketHeaderSize);
 
-    urbs[urb.sequence] = std::move(owned);
-    pendingBytes += urb.length;
-    const Platform::ErrorCode code = device->Submit(urb);
+    urbs_[urb.sequence] = std::move(owned);
+    pendingBytes_ += urb.length;
+    const Platform::ErrorCode code = device_->Submit(urb);
     if (code == Errors::Success) {
         return;
     }
@@ -175,22 +175,22 @@ void UsbIpSession::SubmitPacket() {
 }
 
 void UsbIpSession::Unlink(const UsbIp::UnlinkPacket& packet) {
-    const auto victim = urbs.find(packet.victim);
-    if (victim == urbs.end()) {
+    const auto victim = urbs_.find(packet.victim);
+    if (victim == urbs_.end()) {
         Send(UsbIp::Encode(UsbIp::UnlinkReply{packet.sequence, 0}));
-        notify();
+        notify_();
         return;
     }
     Urb& urb = *victim->second;
     urb.unlinkedBy = packet.sequence;
-    device->Cancel(urb);
+    device_->Cancel(urb);
 }
 
 void UsbIpSession::TransferCompleted(Transfer& transfer) noexcept {
     auto& urb = static_cast<Urb&>(transfer);
-    const std::unique_ptr<Urb> finished = std::move(urbs.extract(urb.sequence).mapped());
-    pendingBytes -= urb.length;
-    if (over) {
+    const std::unique_ptr<Urb> finished = std::move(urbs_.extract(urb.sequence).mapped());
+    pendingBytes_ -= urb.length;
+    if (over_) {
         return;
     }
     if (urb.status == TransferStatus::DeviceGone) {
@@ -209,7 +209,7 @@ void UsbIpSession::TransferCompleted(Transfer& transfer) noexcept {
             Send(UsbIp::Encode(UsbIp::UnlinkReply{*urb.unlinkedBy, 0}));
         }
     }
-    notify();
+    notify_();
 }
 
 }  // namespace Varnholt::Simulator

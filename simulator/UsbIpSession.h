@@ -44,19 +44,19 @@ class UsbIpSession final : private Platform::Usb::TransferClient {
     /// Answers how many of the bytes it has taken; it stops where `WantsInput` becomes false.
     std::size_t Receive(std::span<const std::uint8_t> bytes);
 
-    std::span<const std::uint8_t> Output() const { return std::span(output).subspan(sent); }
+    std::span<const std::uint8_t> Output() const { return std::span(output_).subspan(sent_); }
     void OutputSent(std::size_t count);
     /// False while the peer should first take what there is for it.
-    bool WantsInput() const { return !over && Output().size() < MostOutput; }
+    bool WantsInput() const { return !over_ && Output().size() < MostOutput; }
 
     /// Nothing is received any more; to be closed as soon as there is no output.
-    bool Over() const { return over; }
+    bool Over() const { return over_; }
     /// Why it ended, for a log; empty while it runs and when it ended as it should.
-    const std::string& Complaint() const { return complaint; }
-    bool Imported() const { return device != nullptr; }
+    const std::string& Complaint() const { return complaint_; }
+    bool Imported() const { return device_ != nullptr; }
     /// Whether the peer has to go on soon: it may only be silent between two messages after an import.
     bool PeerIsDue() const {
-        return over || !Imported() || !input.empty() || next == &UsbIpSession::SubmitPacket;
+        return over_ || !Imported() || !input_.empty() || next_ == &UsbIpSession::SubmitPacket;
     }
 
   private:
@@ -78,23 +78,23 @@ class UsbIpSession final : private Platform::Usb::TransferClient {
     void Send(std::span<const std::uint8_t> bytes);
     void End(const std::string& reason = {});
 
-    UsbIpExports* const exports;
-    const std::function<void()> notify;
-    std::shared_ptr<Platform::Usb::UsbDevice> device;
+    UsbIpExports* const exports_;
+    const std::function<void()> notify_;
+    std::shared_ptr<Platform::Usb::UsbDevice> device_;
 
     // The message, or the part of one, that is being collected, and what it is for.
-    std::vector<std::uint8_t> input;
-    std::size_t expected = 0;
-    void (UsbIpSession::*next)() = nullptr;
-    Platform::Usb::UsbIp::SubmitPacket submit;  // whose payload is being collected
+    std::vector<std::uint8_t> input_;
+    std::size_t expected_ = 0;
+    void (UsbIpSession::*next_)() = nullptr;
+    Platform::Usb::UsbIp::SubmitPacket submit_;  // whose payload is being collected
 
-    std::map<std::uint32_t, std::unique_ptr<Urb>> urbs;  // by sequence number
-    std::uint64_t pendingBytes = 0;
+    std::map<std::uint32_t, std::unique_ptr<Urb>> urbs_;  // by sequence number
+    std::uint64_t pendingBytes_ = 0;
 
-    std::vector<std::uint8_t> output;
-    std::size_t sent = 0;  // of `output`
-    bool over = false;
-    std::string complaint;
+    std::vector<std::uint8_t> output_;
+    std::size_t sent_ = 0;  // of `output`
+    bool over_ = false;
+    std::string complaint_;
 };
 
 }  // namespace Varnholt::Simulator

@@ -12,16 +12,16 @@ class VirtualClock::Impl final {
     VirtualTime time;
 };
 
-VirtualClock::VirtualClock(std::uint64_t seed) : impl(std::make_unique<Impl>(seed)) {}
+VirtualClock::VirtualClock(std::uint64_t seed) : impl_(std::make_unique<Impl>(seed)) {}
 
 VirtualClock::~VirtualClock() = default;
 
 std::uint64_t VirtualClock::ElapsedMicroseconds() const {
-    return impl->time.Elapsed();
+    return impl_->time.Elapsed();
 }
 
 void VirtualClock::HandleDeadlock(DeadlockHandler handler) {
-    impl->time.HandleDeadlock(std::move(handler));
+    impl_->time.HandleDeadlock(std::move(handler));
 }
 
 }  // namespace Varnholt::Simulator

@@ -45,7 +45,7 @@ class VirtualClock final {
 
   private:
     class Impl;
-    const std::unique_ptr<Impl> impl;
+    const std::unique_ptr<Impl> impl_;
 };
 
 }  // namespace Varnholt::Simulator

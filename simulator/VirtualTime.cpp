@@ -39,41 +39,41 @@ class Yielding final : public BlockedCall {
 }  // namespace
 
 VirtualTime::VirtualTime(std::uint64_t seed)
-    : randomState(seed),
-      installer(CurrentThread()),
-      threads{&hostedEvent, &eventThread, &installer},
-      threadsAtRest(threads.size()) {
+    : randomState_(seed),
+      installer_(CurrentThread()),
+      threads_{&hostedEvent_, &eventThread_, &installer_},
+      threadsAtRest_(threads_.size()) {
     const KernelHold hold;
-    installer.state = State::Running;
+    installer_.state = State::Running;
     InstallClock(this);
 }
 
 VirtualTime::~VirtualTime() {
-    decltype(events) dropped;
+    decltype(events_) dropped;
     KernelHold hold;
-    WaitingForThreads call(installer);
-    awaitingEnd = &call;
-    while (threads.size() > threadsAtRest && !call.hopeless) {
+    WaitingForThreads call(installer_);
+    awaitingEnd_ = &call;
+    while (threads_.size() > threadsAtRest_ && !call.hopeless) {
         call.woken = false;
         Block(hold, call, Never);
     }
     if (call.hopeless) {
         Abort("The virtual clock ends before its threads:\n" + DescribeThreads());
     }
-    dropped.swap(events);
-    installer.state = State::Unknown;
+    dropped.swap(events_);
+    installer_.state = State::Unknown;
     InstallClock(nullptr);
-    eventThreadMustEnd = true;
-    eventThread.turn->notify_all();
+    eventThreadMustEnd_ = true;
+    eventThread_.turn->notify_all();
     hold.unlock();
-    if (hasEventThread) {
-        pthread_join(systemEventThread, nullptr);
+    if (hasEventThread_) {
+        pthread_join(systemEventThread_, nullptr);
     }
 }
 
 void VirtualTime::HandleDeadlock(VirtualClock::DeadlockHandler newHandler) {
     const KernelHold hold;
-    handler = std::move(newHandler);
+    handler_ = std::move(newHandler);
 }
 
 WallTime VirtualTime::Wall() {
@@ -84,25 +84,25 @@ WallTime VirtualTime::Wall() {
 
 /// SplitMix64: the same numbers for a seed wherever this is built.
 std::uint64_t VirtualTime::Random() {
-    randomState += 0x9E3779B97F4A7C15u;
-    std::uint64_t value = randomState;
+    randomState_ += 0x9E3779B97F4A7C15u;
+    std::uint64_t value = randomState_;
     value = (value ^ (value >> 30)) * 0xBF58476D1CE4E5B9u;
     value = (value ^ (value >> 27)) * 0x94D049BB133111EBu;
     return value ^ (value >> 31);
 }
 
 bool VirtualTime::IsDue(const ThreadRecord& thread) const {
-    return thread.call->woken || thread.deadline <= now;
+    return thread.call->woken || thread.deadline <= now_;
 }
 
 ThreadRecord* VirtualTime::ChooseReady() {
     const auto isReady = [](const ThreadRecord* thread) { return thread->state == State::Ready; };
-    const auto count = static_cast<std::uint64_t>(std::ranges::count_if(threads, isReady));
+    const auto count = static_cast<std::uint64_t>(std::ranges::count_if(threads_, isReady));
     if (count == 0) {
         return nullptr;
     }
     std::uint64_t skip = count == 1 ? 0 : Random() % count;
-    for (ThreadRecord* const thread : threads) {
+    for (ThreadRecord* const thread : threads_) {
         if (isReady(thread) && skip-- == 0) {
             return thread;
         }
@@ -134,7 +134,7 @@ void VirtualTime::Wake(BlockedCall& call) {
 /// The other process lives in real time: as much of it passes as the wait takes of ours.
 void VirtualTime::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
                                       Microseconds period, WaitableObject* /*only*/, std::uint32_t /*seen*/) {
-    Block(hold, call, std::min(deadline, now + period));
+    Block(hold, call, std::min(deadline, now_ + period));
     if (!call.woken) {
         hold.unlock();
         usleep(static_cast<useconds_t>(period));
@@ -165,7 +165,7 @@ void VirtualTime::AwaitTurn(KernelHold& hold, ThreadRecord& self) {
 
 void VirtualTime::Preempt(KernelHold& hold) {
     ThreadRecord& self = CurrentThread();
-    if (self.state != State::Running || !std::ranges::any_of(threads, [](const ThreadRecord* thread) {
+    if (self.state != State::Running || !std::ranges::any_of(threads_, [](const ThreadRecord* thread) {
             return thread->state == State::Ready;
         })) {
         return;
@@ -190,38 +190,38 @@ void VirtualTime::GiveUpSlice(KernelHold& hold) {
         HandOver(hold, self);
     } else {
         Yielding call(self);
-        Block(hold, call, now + 1);
+        Block(hold, call, now_ + 1);
     }
 }
 
 /// Nobody can run at the present time, which therefore ends.
 void VirtualTime::Advance(KernelHold& hold, ThreadRecord& self) {
     Microseconds deadline = Never;
-    for (const ThreadRecord* const thread : threads) {
+    for (const ThreadRecord* const thread : threads_) {
         if (thread->state == State::Blocked) {
             deadline = std::min(deadline, thread->deadline);
         }
     }
     const Microseconds eventTime =
-        events.empty() || running != 0 ? Never : std::max(events.begin()->first.first, now.load());
+        events_.empty() || running_ != 0 ? Never : std::max(events_.begin()->first.first, now_.load());
     const Microseconds next = std::min(deadline, eventTime);
     if (next == Never) {
         ReportDeadlock(hold);
         return;
     }
-    now = std::max(next, now.load());
+    now_ = std::max(next, now_.load());
     if (eventTime < deadline || (eventTime == deadline && Random() % 2 == 0)) {
         if (CanHost(self)) {
             HostEvent(hold, self);
         } else {
-            eventThreadMustCall = true;
-            eventThread.turn->notify_all();
+            eventThreadMustCall_ = true;
+            eventThread_.turn->notify_all();
             AwaitTurn(hold, self);
         }
         return;
     }
-    for (ThreadRecord* const thread : threads) {
-        if (thread->state == State::Blocked && thread->deadline <= now) {
+    for (ThreadRecord* const thread : threads_) {
+        if (thread->state == State::Blocked && thread->deadline <= now_) {
             thread->state = State::Ready;
         }
     }
@@ -237,14 +237,14 @@ void VirtualTime::PassOn() {
         next->turn->notify_all();
         return;
     }
-    const auto blocked = std::ranges::find(threads, State::Blocked, &ThreadRecord::state);
+    const auto blocked = std::ranges::find(threads_, State::Blocked, &ThreadRecord::state);
     (*blocked)->mustAdvance = true;
     (*blocked)->turn->notify_all();
 }
 
 void VirtualTime::ThreadMade(KernelHold& /*hold*/, ThreadRecord& thread) {
     thread.state = State::Ready;
-    threads.push_back(&thread);
+    threads_.push_back(&thread);
 }
 
 void VirtualTime::ThreadBegins(KernelHold& hold, ThreadRecord& thread) {
@@ -254,7 +254,7 @@ void VirtualTime::ThreadBegins(KernelHold& hold, ThreadRecord& thread) {
 }
 
 void VirtualTime::ThreadNeverBegan(KernelHold& /*hold*/, ThreadRecord& thread) {
-    std::erase(threads, &thread);
+    std::erase(threads_, &thread);
 }
 
 void VirtualTime::ThreadEnds(KernelHold& /*hold*/, ThreadRecord& thread) {
@@ -262,23 +262,23 @@ void VirtualTime::ThreadEnds(KernelHold& /*hold*/, ThreadRecord& thread) {
         return;  // of the time before the clock
     }
     thread.state = State::Unknown;
-    std::erase(threads, &thread);
-    if (awaitingEnd && threads.size() == threadsAtRest) {
-        Wake(*awaitingEnd);
+    std::erase(threads_, &thread);
+    if (awaitingEnd_ && threads_.size() == threadsAtRest_) {
+        Wake(*awaitingEnd_);
     }
     PassOn();
 }
 
 void VirtualTime::ReportDeadlock(KernelHold& hold) {
     const std::string report = "Deadlock: every thread waits and nothing can wake it.\n" + DescribeThreads();
-    const VirtualClock::DeadlockHandler handle = handler;
+    const VirtualClock::DeadlockHandler handle = handler_;
     if (!handle) {
         Abort(report);
     }
     hold.unlock();
     handle(report);
     hold.lock();
-    for (ThreadRecord* const thread : threads) {
+    for (ThreadRecord* const thread : threads_) {
         if (thread->state == State::Blocked) {
             thread->call->hopeless = true;
             thread->state = State::Ready;
@@ -288,14 +288,14 @@ void VirtualTime::ReportDeadlock(KernelHold& hold) {
 
 std::string VirtualTime::DescribeThreads() const {
     std::string text;
-    for (const ThreadRecord* const thread : threads) {
+    for (const ThreadRecord* const thread : threads_) {
         if (thread->state == State::Unknown) {
             continue;
         }
-        text += thread == &hostedEvent || thread == &eventThread
+        text += thread == &hostedEvent_ || thread == &eventThread_
                     ? "  the event that is running"
                     : "  thread " + std::to_string(thread->number);
-        text += thread == &installer ? " (made the clock)" : "";
+        text += thread == &installer_ ? " (made the clock)" : "";
         text += thread->call ? " waits for " + thread->call->Describe() : " could run";
         text += thread->state == State::Hosting ? ", and an event runs on its stack\n" : "\n";
     }

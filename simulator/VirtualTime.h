@@ -38,11 +38,11 @@ class VirtualTime final : public Clock, private EventScheduler {
     VirtualTime(const VirtualTime&) = delete;
     VirtualTime& operator=(const VirtualTime&) = delete;
 
-    Microseconds Elapsed() const { return now - Start; }
+    Microseconds Elapsed() const { return now_ - Start; }
     void HandleDeadlock(VirtualClock::DeadlockHandler handler);
 
     bool TakesTurns() const override { return true; }
-    Microseconds Now() override { return now; }
+    Microseconds Now() override { return now_; }
     WallTime Wall() override;
     EventScheduler& Scheduler() override { return *this; }
 
@@ -81,26 +81,26 @@ class VirtualTime final : public Clock, private EventScheduler {
     /// Not 0, which could be taken for no time at all.
     static constexpr Microseconds Start = 1'000'000;
 
-    std::atomic<Microseconds> now = Start;
-    std::uint64_t randomState;
-    ThreadRecord& installer;
-    ThreadRecord hostedEvent;
-    std::vector<ThreadRecord*> threads;  ///< in the order in which they were made
-    std::size_t threadsAtRest;           ///< of `threads`, without those that `StartThread` has started
+    std::atomic<Microseconds> now_ = Start;
+    std::uint64_t randomState_;
+    ThreadRecord& installer_;
+    ThreadRecord hostedEvent_;
+    std::vector<ThreadRecord*> threads_;  ///< in the order in which they were made
+    std::size_t threadsAtRest_;           ///< of `threads`, without those that `StartThread` has started
 
-    ThreadRecord eventThread;
-    pthread_t systemEventThread{};
-    bool hasEventThread = false;
-    bool eventThreadMustCall = false;
-    bool eventThreadMustEnd = false;
+    ThreadRecord eventThread_;
+    pthread_t systemEventThread_{};
+    bool hasEventThread_ = false;
+    bool eventThreadMustCall_ = false;
+    bool eventThreadMustEnd_ = false;
 
-    std::map<std::pair<Microseconds, EventId>, std::function<void()>> events;
-    EventId running = 0;
-    const ThreadRecord* runningAs = nullptr;
-    std::condition_variable eventEnded;     ///< for threads that do not take turns
-    std::vector<BlockedCall*> forgetting;   ///< wait for the running event's end
-    BlockedCall* awaitingEnd = nullptr;     ///< of the clock's own end
-    VirtualClock::DeadlockHandler handler;  ///< may be empty
+    std::map<std::pair<Microseconds, EventId>, std::function<void()>> events_;
+    EventId running_ = 0;
+    const ThreadRecord* runningAs_ = nullptr;
+    std::condition_variable eventEnded_;     ///< for threads that do not take turns
+    std::vector<BlockedCall*> forgetting_;   ///< wait for the running event's end
+    BlockedCall* awaitingEnd_ = nullptr;     ///< of the clock's own end
+    VirtualClock::DeadlockHandler handler_;  ///< may be empty
 };
 
 }  // namespace Varnholt::Simulator

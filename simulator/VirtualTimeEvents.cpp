@@ -23,7 +23,7 @@ class WaitingForEvent final : public BlockedCall {
 EventScheduler::EventId VirtualTime::CallAt(std::uint64_t time, std::function<void()> event) {
     const EventId id = NewEventId();
     const KernelHold hold;
-    events.emplace(std::pair(time, id), std::move(event));
+    events_.emplace(std::pair(time, id), std::move(event));
     return id;
 }
 
@@ -32,18 +32,18 @@ void VirtualTime::Forget(EventId id) {
     ThreadRecord& self = CurrentThread();
     KernelHold hold;
     const auto found =
-        std::ranges::find_if(events, [id](const auto& waiting) { return waiting.first.second == id; });
-    if (found != events.end()) {
+        std::ranges::find_if(events_, [id](const auto& waiting) { return waiting.first.second == id; });
+    if (found != events_.end()) {
         dropped = std::move(found->second);
-        events.erase(found);
-    } else if (running == id && &self != runningAs) {
+        events_.erase(found);
+    } else if (running_ == id && &self != runningAs_) {
         if (self.state == State::Running) {
             WaitingForEvent call(self);
-            forgetting.push_back(&call);
+            forgetting_.push_back(&call);
             Block(hold, call, Never);
-            std::erase(forgetting, &call);
+            std::erase(forgetting_, &call);
         } else {
-            hold.Wait(eventEnded, [this, id] { return running != id; });
+            hold.Wait(eventEnded_, [this, id] { return running_ != id; });
         }
     }
     hold.unlock();
@@ -55,15 +55,15 @@ bool VirtualTime::CanHost(const ThreadRecord& thread) {
     }
     // Without the thread for events, one that needs a lock of its host is reported as a deadlock; nothing
     // worse.
-    hasEventThread = hasEventThread || StartSystemThread(systemEventThread, RunEventThread, this);
-    return !hasEventThread;
+    hasEventThread_ = hasEventThread_ || StartSystemThread(systemEventThread_, RunEventThread, this);
+    return !hasEventThread_;
 }
 
 void VirtualTime::HostEvent(KernelHold& hold, ThreadRecord& host) {
     const ErrorCode errorOfHost = LastError();
     host.state = State::Hosting;
-    BindCurrentThread(&hostedEvent);
-    CallEvent(hold, hostedEvent);
+    BindCurrentThread(&hostedEvent_);
+    CallEvent(hold, hostedEvent_);
     BindCurrentThread(&host);
     host.state = IsDue(host) ? State::Ready : State::Blocked;
     SetLastError(errorOfHost);
@@ -71,23 +71,23 @@ void VirtualTime::HostEvent(KernelHold& hold, ThreadRecord& host) {
 
 /// Calls the first event on the stack of the calling thread, which then has the baton still.
 void VirtualTime::CallEvent(KernelHold& hold, ThreadRecord& as) {
-    const auto first = events.begin();
-    running = first->first.second;
-    runningAs = &as;
+    const auto first = events_.begin();
+    running_ = first->first.second;
+    runningAs_ = &as;
     std::function<void()> event = std::move(first->second);
-    events.erase(first);
+    events_.erase(first);
     as.state = State::Running;
     hold.unlock();
     event();
     event = nullptr;
     hold.lock();
     as.state = State::Unknown;
-    running = 0;
-    runningAs = nullptr;
-    for (BlockedCall* const call : std::exchange(forgetting, {})) {
+    running_ = 0;
+    runningAs_ = nullptr;
+    for (BlockedCall* const call : std::exchange(forgetting_, {})) {
         Wake(*call);
     }
-    eventEnded.notify_all();
+    eventEnded_.notify_all();
 }
 
 void* VirtualTime::RunEventThread(void* time) {
@@ -97,15 +97,15 @@ void* VirtualTime::RunEventThread(void* time) {
 }
 
 void VirtualTime::ServeEvents(KernelHold& hold) {
-    BindCurrentThread(&eventThread);
+    BindCurrentThread(&eventThread_);
     while (true) {
-        hold.Wait(*eventThread.turn, [this] { return eventThreadMustCall || eventThreadMustEnd; });
-        if (eventThreadMustEnd) {
+        hold.Wait(*eventThread_.turn, [this] { return eventThreadMustCall_ || eventThreadMustEnd_; });
+        if (eventThreadMustEnd_) {
             BindCurrentThread(nullptr);
             return;
         }
-        eventThreadMustCall = false;
-        CallEvent(hold, eventThread);
+        eventThreadMustCall_ = false;
+        CallEvent(hold, eventThread_);
         PassOn();
     }
 }

@@ -28,22 +28,22 @@ class Mailbox final : public DeviceDriver::Generic::EventListener {
     };
 
     void MessageFromDevice(std::uint32_t code, std::uint32_t) override {
-        const Platform::CriticalSection::Holder holder(section);
-        waiting.push_back({code, time.Milliseconds()});
+        const Platform::CriticalSection::Holder holder(section_);
+        waiting_.push_back({code, time_.Milliseconds()});
     }
     std::uint64_t Now() {
-        const Platform::CriticalSection::Holder holder(section);
-        return time.Milliseconds();
+        const Platform::CriticalSection::Holder holder(section_);
+        return time_.Milliseconds();
     }
     std::deque<Message> Take() {
-        const Platform::CriticalSection::Holder holder(section);
-        return std::exchange(waiting, {});
+        const Platform::CriticalSection::Holder holder(section_);
+        return std::exchange(waiting_, {});
     }
 
   private:
-    Platform::CriticalSection section;  ///< guards what follows
-    ElapsedTime time;
-    std::deque<Message> waiting;
+    Platform::CriticalSection section_;  ///< guards what follows
+    ElapsedTime time_;
+    std::deque<Message> waiting_;
 };
 
 constexpr std::uint32_t LookInterval = 20;  // milliseconds

@@ -68,17 +68,17 @@ constexpr const char* Noun = "readout";
 class Formatter final {
   public:
     Formatter(Session& usedSession, const Options& chosen, std::string identifier)
-        : session(usedSession),
-          options(chosen),
-          instrument(std::move(identifier)),
-          isDrawnOver(!GoesToFile(options.output) && session.OutFacts().isTerminal),
-          block(session.OutFacts()) {}
+        : session_(usedSession),
+          options_(chosen),
+          instrument_(std::move(identifier)),
+          isDrawnOver_(!GoesToFile(options_.output) && session_.OutFacts().isTerminal),
+          block_(session_.OutFacts()) {}
 
-    void SetFacts(const MeasurementFacts& measurement) { facts = measurement; }
+    void SetFacts(const MeasurementFacts& measurement) { facts_ = measurement; }
 
     /// What stands before the first readout.
     std::string Head() const {
-        if (!options.csv) {
+        if (!options_.csv) {
             return {};
         }
         std::array<int, Protocol::ReadoutValues> indices{};
@@ -88,28 +88,28 @@ class Formatter final {
 
     std::string TextOf(const Readout& readout) {
         const Values values = readout.GetValues();
-        if (options.raw) {
+        if (options_.raw) {
             return {readout.bytes.begin(), readout.bytes.end()};
         }
-        if (options.json) {
+        if (options_.json) {
             std::ostringstream line;
-            PrintJson(line, {{"identifier", instrument},
+            PrintJson(line, {{"identifier", instrument_},
                              {"readout", readout.number},
                              {"seconds", readout.seconds},
                              {"values", values},
                              {"time", WallTimeText(readout.time)},
-                             {"parameters", {facts.p1, facts.p2, facts.p3, facts.p4}},
-                             {"integrationTime", facts.integrationTime}});
+                             {"parameters", {facts_.p1, facts_.p2, facts_.p3, facts_.p4}},
+                             {"integrationTime", facts_.integrationTime}});
             return line.str();
         }
-        if (options.csv) {
+        if (options_.csv) {
             return fmt::format("{},{:.3f},{},{},{},{},{},{},{}\n", readout.number, readout.seconds,
-                               fmt::join(values, ","), WallTimeText(readout.time), facts.p1, facts.p2,
-                               facts.p3, facts.p4, facts.integrationTime);
+                               fmt::join(values, ","), WallTimeText(readout.time), facts_.p1, facts_.p2,
+                               facts_.p3, facts_.p4, facts_.integrationTime);
         }
         const std::string summary =
-            (options.repeat != 1 ? fmt::format("readout {}: ", readout.number) : "") + Summary(values);
-        if (!options.plot) {
+            (options_.repeat != 1 ? fmt::format("readout {}: ", readout.number) : "") + Summary(values);
+        if (!options_.plot) {
             return (readout.number > 1 ? "\n" : "") + TableOf(values) + summary + '\n';
         }
         return PlotOf(values, summary);
@@ -117,12 +117,12 @@ class Formatter final {
 
   private:
     std::string PlotOf(const Values& values, const std::string& summary) {
-        PlotStyle style = session.StyleOfPlots();
-        style.braille = style.braille && !options.ascii;
+        PlotStyle style = session_.StyleOfPlots();
+        style.braille = style.braille && !options_.ascii;
         std::string below = summary + '\n';
-        if (isDrawnOver) {
+        if (isDrawnOver_) {
             // All of it is on the screen, or it could not be drawn over.
-            const TerminalSize size = session.OutFacts().size();
+            const TerminalSize size = session_.OutFacts().size();
             below = Wrapped(summary, static_cast<std::size_t>(std::max(size.columns - 1, 1)));
             const int linesOfAxis = PlotLines(style) - style.height;
             const auto linesBelow = static_cast<int>(std::count(below.begin(), below.end(), '\n'));
@@ -131,15 +131,15 @@ class Formatter final {
         std::ostringstream drawn;
         const std::vector<double> points(values.begin(), values.end());
         PrintPlot(drawn, points, style);
-        return isDrawnOver ? block.Over(drawn.str() + below) : drawn.str() + below;
+        return isDrawnOver_ ? block_.Over(drawn.str() + below) : drawn.str() + below;
     }
 
-    Session& session;
-    const Options& options;
-    const std::string instrument;
-    const bool isDrawnOver;
-    LiveBlock block;
-    MeasurementFacts facts;
+    Session& session_;
+    const Options& options_;
+    const std::string instrument_;
+    const bool isDrawnOver_;
+    LiveBlock block_;
+    MeasurementFacts facts_;
 };
 
 /// Waits until it is due, so many milliseconds after the first, and takes it.

@@ -14,19 +14,19 @@ namespace {
 class Descriptor final : public ByteSource {
   public:
     Descriptor(int openDescriptor, std::string name)
-        : descriptor(openDescriptor), shownName(std::move(name)) {
-        if (descriptor < 0) {
+        : descriptor_(openDescriptor), shownName_(std::move(name)) {
+        if (descriptor_ < 0) {
             Fail();
         }
     }
-    ~Descriptor() override { ::close(descriptor); }
+    ~Descriptor() override { ::close(descriptor_); }
     Descriptor(const Descriptor&) = delete;
     Descriptor& operator=(const Descriptor&) = delete;
 
-    bool IsTerminal() const override { return ::isatty(descriptor) != 0; }
+    bool IsTerminal() const override { return ::isatty(descriptor_) != 0; }
 
     bool Wait(std::uint32_t milliseconds) override {
-        pollfd watched{descriptor, POLLIN, 0};
+        pollfd watched{descriptor_, POLLIN, 0};
         const int found = ::poll(&watched, 1, static_cast<int>(milliseconds));
         if (found < 0 && errno != EINTR) {
             Fail();
@@ -35,7 +35,7 @@ class Descriptor final : public ByteSource {
     }
 
     std::size_t Read(std::uint8_t* buffer, std::size_t size) override {
-        const ssize_t count = ::read(descriptor, buffer, size);
+        const ssize_t count = ::read(descriptor_, buffer, size);
         if (count < 0) {
             Fail();
         }
@@ -45,11 +45,11 @@ class Descriptor final : public ByteSource {
   private:
     [[noreturn]] void Fail() const {
         throw ToolFailure(ExitCode::File,
-                          "cannot read " + shownName + ": " + std::generic_category().message(errno));
+                          "cannot read " + shownName_ + ": " + std::generic_category().message(errno));
     }
 
-    const int descriptor;
-    const std::string shownName;
+    const int descriptor_;
+    const std::string shownName_;
 };
 
 }  // namespace

@@ -12,14 +12,14 @@ namespace {
 class File final : public ByteSource {
   public:
     File(HANDLE openFile, bool isOwn, std::string name)
-        : file(openFile), owned(isOwn), shownName(std::move(name)) {
-        if (file == INVALID_HANDLE_VALUE || file == nullptr) {
+        : file_(openFile), owned_(isOwn), shownName_(std::move(name)) {
+        if (file_ == INVALID_HANDLE_VALUE || file_ == nullptr) {
             Fail();
         }
     }
     ~File() override {
-        if (owned) {
-            ::CloseHandle(file);
+        if (owned_) {
+            ::CloseHandle(file_);
         }
     }
     File(const File&) = delete;
@@ -27,15 +27,15 @@ class File final : public ByteSource {
 
     bool IsTerminal() const override {
         DWORD mode = 0;
-        return ::GetConsoleMode(file, &mode) != 0;
+        return ::GetConsoleMode(file_, &mode) != 0;
     }
 
     bool Wait(std::uint32_t milliseconds) override {
         // A pipe cannot be waited for: it is looked at from time to time.
         constexpr std::uint32_t lookEvery = 10;
-        for (std::uint32_t waited = 0; ::GetFileType(file) == FILE_TYPE_PIPE; waited += lookEvery) {
+        for (std::uint32_t waited = 0; ::GetFileType(file_) == FILE_TYPE_PIPE; waited += lookEvery) {
             DWORD available = 0;
-            if (::PeekNamedPipe(file, nullptr, 0, nullptr, &available, nullptr) == 0 || available > 0) {
+            if (::PeekNamedPipe(file_, nullptr, 0, nullptr, &available, nullptr) == 0 || available > 0) {
                 break;
             }
             if (waited >= milliseconds) {
@@ -49,7 +49,7 @@ class File final : public ByteSource {
     std::size_t Read(std::uint8_t* buffer, std::size_t size) override {
         DWORD count = 0;
         // The end of a pipe is an error of its own.
-        if (::ReadFile(file, buffer, static_cast<DWORD>(size), &count, nullptr) == 0 &&
+        if (::ReadFile(file_, buffer, static_cast<DWORD>(size), &count, nullptr) == 0 &&
             ::GetLastError() != ERROR_BROKEN_PIPE) {
             Fail();
         }
@@ -60,12 +60,12 @@ class File final : public ByteSource {
     [[noreturn]] void Fail() const {
         const auto code = static_cast<int>(::GetLastError());
         throw ToolFailure(ExitCode::File,
-                          "cannot read " + shownName + ": " + std::system_category().message(code));
+                          "cannot read " + shownName_ + ": " + std::system_category().message(code));
     }
 
-    const HANDLE file;
-    const bool owned;
-    const std::string shownName;
+    const HANDLE file_;
+    const bool owned_;
+    const std::string shownName_;
 };
 
 }  // namespace

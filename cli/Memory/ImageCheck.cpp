@@ -61,27 +61,27 @@ std::size_t CountUsed(std::span<const std::uint8_t> bytes) {
 
 class Checker final {
   public:
-    explicit Checker(const EepromImage& checked) : image(checked), bytes(checked) {}
+    explicit Checker(const EepromImage& checked) : image_(checked), bytes_(checked) {}
 
     std::vector<ImageFinding> Run() {
         if (CheckHeader()) {
-            const PellandoEAT table = TableOf(image);
+            const PellandoEAT table = TableOf(image_);
             CheckEntries(table);
             CheckPlaces(table);
             CheckModel(table);
         }
         CheckOtherAreas();
-        return std::move(findings);
+        return std::move(findings_);
     }
 
   private:
     void Add(Severity severity, const char* area, std::string text) {
-        findings.push_back({severity, area, std::move(text)});
+        findings_.push_back({severity, area, std::move(text)});
     }
 
     bool CheckHeader() {
-        const std::uint16_t version = Protocol::LoadBig16(&image[Map::Table + Layout::Version]);
-        const std::uint16_t length = Protocol::LoadBig16(&image[Map::Table + Layout::Length]);
+        const std::uint16_t version = Protocol::LoadBig16(&image_[Map::Table + Layout::Version]);
+        const std::uint16_t length = Protocol::LoadBig16(&image_[Map::Table + Layout::Length]);
         if (version != Layout::KnownVersion) {
             Add(Severity::Error, TableArea,
                 fmt::format("version {} instead of {}: the driver refuses the image", version,
@@ -109,7 +109,7 @@ class Checker final {
                 unknown.push_back(id);
             }
         }
-        const auto length = Protocol::LoadBig16(&image[Map::Table + Layout::Length]);
+        const auto length = Protocol::LoadBig16(&image_[Map::Table + Layout::Length]);
         std::size_t written = 0;
         for (std::uint32_t at = Layout::FirstEntry; at < length && at + Layout::EntrySize <= Map::TableArea;
              at += Layout::EntrySize) {
@@ -197,7 +197,7 @@ class Checker final {
 
     void CheckModel(const PellandoEAT& table) {
         try {
-            ImageModel model(image);
+            ImageModel model(image_);
             CheckLogs();
             CheckCalibration(model.Calibration());
             CheckWriting(table, model);
@@ -229,7 +229,7 @@ class Checker final {
     }
 
     void CheckLogs() {
-        const LogCopies copies = ReadLogCopies(image);
+        const LogCopies copies = ReadLogCopies(image_);
         const auto report = [this](const char* name, const LogCopy& copy) {
             if (!copy.isReadable) {
                 Add(Severity::Warning, LogArea, std::string(name) + ": the table does not hold it");
@@ -284,13 +284,13 @@ class Checker final {
     }
 
     void CheckOtherAreas() {
-        const std::size_t binary = CountUsed(bytes.subspan(Map::BinaryFirst, Map::BinaryFirstSize)) +
-                                   CountUsed(bytes.subspan(Map::BinarySecond, Map::BinarySecondSize));
+        const std::size_t binary = CountUsed(bytes_.subspan(Map::BinaryFirst, Map::BinaryFirstSize)) +
+                                   CountUsed(bytes_.subspan(Map::BinarySecond, Map::BinarySecondSize));
         Add(Severity::Fine, "binary block",
             binary == 0 ? "empty" : fmt::format("{} of {} bytes used", binary, Map::BinarySize));
         std::set<std::uint32_t> words;
         for (std::uint32_t at = Map::RawWords; at < Map::EndOfLogArea; ++at) {
-            if (image[at] != 0xFF) {
+            if (image_[at] != 0xFF) {
                 words.insert((at - Map::RawWords) / Map::RawWordSize);
             }
         }
@@ -298,15 +298,15 @@ class Checker final {
             words.empty() ? "empty"
                           : fmt::format("{} of {} used", words.size(),
                                         (Map::EndOfLogArea - Map::RawWords) / Map::RawWordSize));
-        const std::size_t rest = CountUsed(bytes.subspan(Map::Calibration + Map::CalibrationSize));
+        const std::size_t rest = CountUsed(bytes_.subspan(Map::Calibration + Map::CalibrationSize));
         if (rest > 0) {
             Add(Severity::Note, "rest", fmt::format("{} bytes behind the calibration data are used", rest));
         }
     }
 
-    const EepromImage& image;
-    const std::span<const std::uint8_t> bytes;
-    std::vector<ImageFinding> findings;
+    const EepromImage& image_;
+    const std::span<const std::uint8_t> bytes_;
+    std::vector<ImageFinding> findings_;
 };
 
 }  // namespace

@@ -40,15 +40,15 @@ LogCopy ReadCopy(const PellandoEAT& table, const EepromImage& image, std::uint16
 
 }  // namespace
 
-ImageModel::ImageModel(EepromImage image) : contents(std::move(image)) {
-    const SmartPointer<PellandoFunctionalityByte> transport(new ImageTransport(contents));
+ImageModel::ImageModel(EepromImage image) : contents_(std::move(image)) {
+    const SmartPointer<PellandoFunctionalityByte> transport(new ImageTransport(contents_));
     const SmartPointer<PellandoFunctionality> commands(new PellandoFunctionality(transport));
-    memory = std::make_unique<PellandoEEPROM>(commands);
+    memory_ = std::make_unique<PellandoEEPROM>(commands);
 }
 
 Properties ImageModel::LoadSet(const char* name) {
     Properties set(name);
-    return memory->Load(set);
+    return memory_->Load(set);
 }
 
 Properties ImageModel::Calibration() {

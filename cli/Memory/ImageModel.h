@@ -20,9 +20,9 @@ class ImageModel final {
     ImageModel(const ImageModel&) = delete;
     ImageModel& operator=(const ImageModel&) = delete;
 
-    Memory& Get() { return *memory; }
+    Memory& Get() { return *memory_; }
     /// The copy, with what the model has written to it so far.
-    const EepromImage& Contents() const { return contents; }
+    const EepromImage& Contents() const { return contents_; }
 
     Properties Calibration();
     Properties Log();
@@ -31,8 +31,8 @@ class ImageModel final {
   private:
     Properties LoadSet(const char* name);
 
-    EepromImage contents;
-    std::unique_ptr<Memory> memory;
+    EepromImage contents_;
+    std::unique_ptr<Memory> memory_;
 };
 
 /// The allocation table of an image; throws what the memory model throws of one that it cannot use.

@@ -20,10 +20,10 @@ using Utilities::Exceptions::Here;
 
 std::uint8_t* ImageTransport::Place(const Bytes4& address, std::uint32_t count) const {
     const std::size_t first = Protocol::LoadBig32(address.data());
-    if (first > image.size() || count > image.size() - first) {
+    if (first > image_.size() || count > image_.size() - first) {
         throw IOException("access beyond the end of the EEPROM", Here());
     }
-    return image.data() + first;
+    return image_.data() + first;
 }
 
 void ImageTransport::WriteEEPROM(const Bytes4& address, const Bytes2&, const std::uint8_t* data,

@@ -14,7 +14,7 @@ class ImageTransport final : public DeviceDriver::Ostra::LowLevel::PellandoFunct
     using Bytes4 = DeviceDriver::Ostra::LowLevel::Bytes4;
 
     /// `contents` must outlive the object.
-    explicit ImageTransport(EepromImage& contents) : image(contents) {}
+    explicit ImageTransport(EepromImage& contents) : image_(contents) {}
 
     void WriteEEPROM(const Bytes4& address, const Bytes2& length, const std::uint8_t* data,
                      std::uint32_t count) override;
@@ -42,7 +42,7 @@ class ImageTransport final : public DeviceDriver::Ostra::LowLevel::PellandoFunct
   private:
     std::uint8_t* Place(const Bytes4& address, std::uint32_t count) const;
 
-    EepromImage& image;
+    EepromImage& image_;
 };
 
 }  // namespace Varnholt::Cli

@@ -89,25 +89,25 @@ void AddChangeOptions(CommandSpec command, ChangeOptions& options, BackupHabit h
 }
 
 MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, Use use)
-    : session(usedSession), file(options.imageFile) {
-    if (!file.empty()) {
+    : session_(usedSession), file_(options.imageFile) {
+    if (!file_.empty()) {
         if (use == Use::Change) {
-            RefuseToChangeInPlace(file);
+            RefuseToChangeInPlace(file_);
         }
-        name = ShownSource(file);
-        image = ReadImageFile(session, file);
+        name_ = ShownSource(file_);
+        image_ = ReadImageFile(session_, file_);
         return;
     }
-    instrument.emplace(
-        session, options.instrument,
+    instrument_.emplace(
+        session_, options.instrument,
         use == Use::Change ? Instrument::Choice::MustBeNamed : Instrument::Choice::FirstWillDo);
-    name = instrument->Identifier();
-    image = ReadEepromTwice(session, *instrument);
+    name_ = instrument_->Identifier();
+    image_ = ReadEepromTwice(session_, *instrument_);
 }
 
 ToolFailure MemoryTarget::Unusable(const std::string& reason) const {
-    const std::string which = instrument ? "--device " + ShortNameOf(name) : QuotedSource(file);
-    return {ExitCode::BadData, name + ": the driver cannot use what is in it: " + reason,
+    const std::string which = instrument_ ? "--device " + ShortNameOf(name_) : QuotedSource(file_);
+    return {ExitCode::BadData, name_ + ": the driver cannot use what is in it: " + reason,
             "`ostra eeprom check " + which + "` tells what is wrong with it"};
 }
 
@@ -116,18 +116,18 @@ std::string MemoryTarget::MakeBackup(const ChangeOptions& options) {
         return {};
     }
     if (options.backupFile == StandardStream) {
-        session.ClaimOut();
-        session.WriteClaimedOut(image);
-        session.Note("backup of " + name + " written to standard output");
+        session_.ClaimOut();
+        session_.WriteClaimedOut(image_);
+        session_.Note("backup of " + name_ + " written to standard output");
         return options.backupFile;
     }
     std::string backup = options.backupFile;
     if (!backup.empty()) {
-        WriteFileAtomically(backup, image, AtomicFile::IfItExists::Refuse);
+        WriteFileAtomically(backup, image_, AtomicFile::IfItExists::Refuse);
     } else {
-        backup = NewBackupName(name, instrument->ChipId());
+        backup = NewBackupName(name_, instrument_->ChipId());
         try {
-            WriteFileAtomically(backup, image, AtomicFile::IfItExists::Refuse);
+            WriteFileAtomically(backup, image_, AtomicFile::IfItExists::Refuse);
         } catch (const ToolFailure& failure) {
             throw ToolFailure(
                 failure.Code(),
@@ -136,7 +136,7 @@ std::string MemoryTarget::MakeBackup(const ChangeOptions& options) {
                 "--backup FILE makes it elsewhere; --no-backup leaves it out");
         }
     }
-    session.Note("backup of " + name + " written to " + backup);
+    session_.Note("backup of " + name_ + " written to " + backup);
     return backup;
 }
 
@@ -147,49 +147,49 @@ std::string MemoryTarget::WayBack(const std::string& backup) const {
     const bool isPiped = backup == StandardStream;
     return fmt::format("this brings back what was there before{}: ostra eeprom restore {} --device {}{}",
                        isPiped ? " (FILE: what went to standard output)" : "",
-                       isPiped ? "FILE" : QuotedFileName(backup), ShortNameOf(name),
-                       IsSane(CheckImage(image)) ? "" : " --force");
+                       isPiped ? "FILE" : QuotedFileName(backup), ShortNameOf(name_),
+                       IsSane(CheckImage(image_)) ? "" : " --force");
 }
 
 MemoryTarget::Outcome MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& options,
                                            Granularity granularity) {
-    Outcome outcome{options.dryRun, CountDifferences(image, wanted), 0, {}};
-    if (instrument) {
-        const std::vector<WritePiece> pieces = PiecesToWrite(image, wanted, granularity);
+    Outcome outcome{options.dryRun, CountDifferences(image_, wanted), 0, {}};
+    if (instrument_) {
+        const std::vector<WritePiece> pieces = PiecesToWrite(image_, wanted, granularity);
         outcome.pieces = pieces.size();
         if (!options.dryRun && !pieces.empty()) {
             outcome.backup = MakeBackup(options);
-            WriteEeprom(session, *instrument, wanted, pieces, WayBack(outcome.backup));
+            WriteEeprom(session_, *instrument_, wanted, pieces, WayBack(outcome.backup));
         }
-    } else if (!options.dryRun && file == StandardStream) {
-        session.ClaimOut();
-        session.WriteClaimedOut(wanted);  // with or without a change: the next one waits for it
+    } else if (!options.dryRun && file_ == StandardStream) {
+        session_.ClaimOut();
+        session_.WriteClaimedOut(wanted);  // with or without a change: the next one waits for it
     } else if (!options.dryRun && outcome.bytes > 0) {
-        WriteFileAtomically(file, wanted);
+        WriteFileAtomically(file_, wanted);
     }
     return outcome;
 }
 
 void MemoryTarget::Report(const Outcome& outcome, bool asJson, const Json& details) const {
     if (asJson) {
-        Json result = {{"target", name},
+        Json result = {{"target", name_},
                        {"dryRun", outcome.dryRun},
                        {"changedBytes", outcome.bytes},
                        {"pieces", outcome.pieces},
                        {"backup", outcome.backup.empty() ? Json(nullptr) : Json(outcome.backup)}};
         result.update(details);
-        session.Print(result);
+        session_.Print(result);
         return;
     }
     if (outcome.bytes == 0) {
-        session.Out() << name << " holds this already; nothing to write\n";
+        session_.Out() << name_ << " holds this already; nothing to write\n";
         return;
     }
     const bool isInstrument = outcome.pieces > 0;
-    session.Out() << CountOf(outcome.bytes, "byte") << " of " << name
-                  << (outcome.dryRun ? " would be changed" : " changed")
-                  << (isInstrument ? " in " + CountOf(outcome.pieces, "piece") : "")
-                  << (isInstrument && !outcome.dryRun ? ", read back and compared" : "") << '\n';
+    session_.Out() << CountOf(outcome.bytes, "byte") << " of " << name_
+                   << (outcome.dryRun ? " would be changed" : " changed")
+                   << (isInstrument ? " in " + CountOf(outcome.pieces, "piece") : "")
+                   << (isInstrument && !outcome.dryRun ? ", read back and compared" : "") << '\n';
 }
 
 }  // namespace Varnholt::Cli

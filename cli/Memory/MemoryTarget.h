@@ -43,15 +43,15 @@ class MemoryTarget final {
     MemoryTarget(Session& session, const MemoryOptions& options, Use use);
 
     /// The instrument's identifier or the file's name.
-    const std::string& Name() const { return name; }
-    const EepromImage& Image() const { return image; }
+    const std::string& Name() const { return name_; }
+    const EepromImage& Image() const { return image_; }
 
     /// What `read` makes of the image's values. The memory model's refusal of an image is a `ToolFailure`
     /// that names the image and how to look into it.
     template <class Read>
     auto Interpret(Read read) const {
         try {
-            return read(image);
+            return read(image_);
         } catch (const Utilities::Exceptions::RuntimeException& exception) {
             throw Unusable(exception.what());
         }
@@ -76,11 +76,11 @@ class MemoryTarget final {
     std::string MakeBackup(const ChangeOptions& options);
     std::string WayBack(const std::string& backup) const;
 
-    Session& session;
-    std::string file;
-    std::optional<Instrument> instrument;
-    std::string name;
-    EepromImage image;
+    Session& session_;
+    std::string file_;
+    std::optional<Instrument> instrument_;
+    std::string name_;
+    EepromImage image_;
 };
 
 }  // namespace Varnholt::Cli

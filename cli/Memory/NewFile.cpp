@@ -14,30 +14,30 @@ void AddNewFileOptions(CommandSpec command, const char* names, NewFileOptions& o
 }
 
 NewFile::NewFile(Session& usedSession, const NewFileOptions& chosen)
-    : session(usedSession), options(chosen), isStandardOutput(chosen.name == StandardStream) {
-    if (isStandardOutput) {
-        session.ClaimOut();
+    : session_(usedSession), options_(chosen), isStandardOutput_(chosen.name == StandardStream) {
+    if (isStandardOutput_) {
+        session_.ClaimOut();
         return;
     }
     std::error_code error;
-    replaces = options.force || std::filesystem::is_other(options.name, error);
-    if (!replaces && std::filesystem::is_regular_file(options.name, error)) {
-        throw ToolFailure(ExitCode::File, options.name + " exists already",
+    replaces_ = options_.force || std::filesystem::is_other(options_.name, error);
+    if (!replaces_ && std::filesystem::is_regular_file(options_.name, error)) {
+        throw ToolFailure(ExitCode::File, options_.name + " exists already",
                           "--force replaces it; or name a file that does not exist yet");
     }
 }
 
 void NewFile::Write(std::span<const std::uint8_t> content) const {
-    if (isStandardOutput) {
-        session.WriteClaimedOut(content);
+    if (isStandardOutput_) {
+        session_.WriteClaimedOut(content);
     } else {
-        WriteFileAtomically(options.name, content,
-                            replaces ? AtomicFile::IfItExists::Replace : AtomicFile::IfItExists::Refuse);
+        WriteFileAtomically(options_.name, content,
+                            replaces_ ? AtomicFile::IfItExists::Replace : AtomicFile::IfItExists::Refuse);
     }
 }
 
 std::string NewFile::ShownName() const {
-    return isStandardOutput ? "standard output" : options.name;
+    return isStandardOutput_ ? "standard output" : options_.name;
 }
 
 }  // namespace Varnholt::Cli

@@ -31,10 +31,10 @@ class NewFile final {
     std::string ShownName() const;
 
   private:
-    Session& session;
-    const NewFileOptions& options;
-    const bool isStandardOutput;
-    bool replaces = false;
+    Session& session_;
+    const NewFileOptions& options_;
+    const bool isStandardOutput_;
+    bool replaces_ = false;
 };
 
 }  // namespace Varnholt::Cli

@@ -152,18 +152,18 @@ void CheckTimes(const Properties& set, const Mode& mode) {
 }  // namespace
 
 Properties RamAccess::Load() {
-    PellandoRAM ram(commands);
+    PellandoRAM ram(commands_);
     Properties set("PhysicalConditions");
     ram.Load(set);
-    loaded.reset();
+    loaded_.reset();
     if (HasModes(set)) {
         std::uint16_t p1 = 0, p2 = 0, p3 = 0;
         std::uint8_t p4 = 0, p5 = 0;
-        commands->GetMeasureParameters(p1, p2, p3, p4, p5);
-        const Mode mode = CurrentMode(*commands);
+        commands_->GetMeasureParameters(p1, p2, p3, p4, p5);
+        const Mode mode = CurrentMode(*commands_);
         const double tick = mode.tickMicroseconds * Microsecond;
-        loaded = {static_cast<float>(p1 * tick), p1, mode.number};
-        set.SetProperty(Ids::IntegrationTime, Property(loaded->seconds));
+        loaded_ = {static_cast<float>(p1 * tick), p1, mode.number};
+        set.SetProperty(Ids::IntegrationTime, Property(loaded_->seconds));
         set.SetProperty(Ids::SecondTime, Property(static_cast<float>(p2 * mode.coarseFactor * tick)));
     }
     return set;
@@ -171,11 +171,11 @@ Properties RamAccess::Load() {
 
 void RamAccess::SwitchMode(PellandoRAM& ram, Properties& set, std::uint8_t currentMode) {
     const float wanted = set.GetProperty(Ids::IntegrationTime).AsFloat();
-    const bool isAsLoaded = loaded && loaded->seconds == wanted && loaded->mode == currentMode;
+    const bool isAsLoaded = loaded_ && loaded_->seconds == wanted && loaded_->mode == currentMode;
     set.SetProperty(Ids::IntegrationTime, Property(AsWholeMicroseconds(wanted)));
     try {
         ram.SwitchToPerfectMode(set);
-        if (!isAsLoaded || CurrentMode(*commands).number == currentMode) {
+        if (!isAsLoaded || CurrentMode(*commands_).number == currentMode) {
             return;
         }
     } catch (const ResourceException&) {
@@ -184,7 +184,7 @@ void RamAccess::SwitchMode(PellandoRAM& ram, Properties& set, std::uint8_t curre
         }
     }
     // The count was made of another time, which the mode's neighbours do not take.
-    if (const auto time = TimeOf(loaded->count, currentMode, ListModes(*commands))) {
+    if (const auto time = TimeOf(loaded_->count, currentMode, ListModes(*commands_))) {
         set.SetProperty(Ids::IntegrationTime, Property(*time));
     }
     ram.SwitchToPerfectMode(set);
@@ -192,24 +192,24 @@ void RamAccess::SwitchMode(PellandoRAM& ram, Properties& set, std::uint8_t curre
 
 void RamAccess::Store(const Properties& set) {
     const bool hasModes = HasModes(set);
-    const Mode before = hasModes ? CurrentMode(*commands) : OnlyMode;
-    PellandoRAM ram(commands);
+    const Mode before = hasModes ? CurrentMode(*commands_) : OnlyMode;
+    PellandoRAM ram(commands_);
     Properties sent = set;
     try {
         if (hasModes) {
             SwitchMode(ram, sent, before.number);
         }
-        CheckTimes(sent, hasModes ? CurrentMode(*commands) : OnlyMode);
+        CheckTimes(sent, hasModes ? CurrentMode(*commands_) : OnlyMode);
     } catch (const ResourceException& exception) {
-        const std::string modes = Describe(ListModes(*commands));
-        commands->SetMeasureMode(before.number);
+        const std::string modes = Describe(ListModes(*commands_));
+        commands_->SetMeasureMode(before.number);
         throw ToolFailure(ExitCode::BadData,
                           fmt::format("{}: {} s fits none of the instrument's modes", exception.what(),
                                       set.GetProperty(Ids::IntegrationTime).AsFloat()),
                           modes);
     } catch (const ToolFailure&) {
         if (hasModes) {
-            commands->SetMeasureMode(before.number);
+            commands_->SetMeasureMode(before.number);
         }
         throw;
     }
@@ -219,8 +219,8 @@ void RamAccess::Store(const Properties& set) {
 double RamAccess::TimeUnit() {
     std::uint8_t m1 = 0, m3 = 0;
     std::uint16_t m2 = 0, m4 = 0, m5 = 0;
-    commands->GetMISC(m1, m2, m3, m4, m5);
-    const Mode mode = m2 >= Ids::FirstMisc2WithModes ? CurrentMode(*commands) : OnlyMode;
+    commands_->GetMISC(m1, m2, m3, m4, m5);
+    const Mode mode = m2 >= Ids::FirstMisc2WithModes ? CurrentMode(*commands_) : OnlyMode;
     return mode.tickMicroseconds * Microsecond;
 }
 

@@ -17,7 +17,7 @@ class RamAccess final {
     using Properties = DeviceDriver::Generic::Configuration::Properties;
     using Commands = Utilities::Tools::SmartPointer<DeviceDriver::Ostra::LowLevel::PellandoFunctionality>;
 
-    explicit RamAccess(const Commands& usedCommands) : commands(usedCommands) {}
+    explicit RamAccess(const Commands& usedCommands) : commands_(usedCommands) {}
 
     /// All identifiers of the model's set.
     Properties Load();
@@ -44,8 +44,8 @@ class RamAccess final {
     void SwitchMode(DeviceDriver::Ostra::LowLevel::PellandoRAM& ram, Properties& set,
                     std::uint8_t currentMode);
 
-    const Commands commands;
-    std::optional<LoadedTime> loaded;
+    const Commands commands_;
+    std::optional<LoadedTime> loaded_;
 };
 
 }  // namespace Varnholt::Cli

@@ -18,54 +18,54 @@ std::string ReasonOfLastFailure() {
 
 }  // namespace
 
-AtomicFile::AtomicFile(const std::string& name, IfItExists policy) : finalName(name), ifItExists(policy) {
-    if (finalName.Existed() && ifItExists == IfItExists::Refuse) {
+AtomicFile::AtomicFile(const std::string& name, IfItExists policy) : finalName_(name), ifItExists_(policy) {
+    if (finalName_.Existed() && ifItExists_ == IfItExists::Refuse) {
         FailAsItExists();
     }
     Files::path written = name;
-    if (finalName.CanBeReplaced()) {
-        partial = finalName.Path();
-        partial += ".part" + std::to_string(std::random_device{}());
-        written = partial;
+    if (finalName_.CanBeReplaced()) {
+        partial_ = finalName_.Path();
+        partial_ += ".part" + std::to_string(std::random_device{}());
+        written = partial_;
     }
     errno = 0;
-    stream.open(written, std::ios::binary | std::ios::trunc);
-    if (!stream) {
-        partial.clear();
-        finalName.Fail(ReasonOfLastFailure());
+    stream_.open(written, std::ios::binary | std::ios::trunc);
+    if (!stream_) {
+        partial_.clear();
+        finalName_.Fail(ReasonOfLastFailure());
     }
 }
 
 AtomicFile::~AtomicFile() {
-    if (!committed && !partial.empty()) {
-        stream.close();
+    if (!committed_ && !partial_.empty()) {
+        stream_.close();
         std::error_code ignored;
-        Files::remove(partial, ignored);
+        Files::remove(partial_, ignored);
     }
 }
 
 void AtomicFile::Commit() {
-    if (stream) {
+    if (stream_) {
         errno = 0;
-        stream.close();
+        stream_.close();
     }
-    if (!stream) {  // it may have failed before: then the reason is still that of the write
-        finalName.Fail(ReasonOfLastFailure());
+    if (!stream_) {  // it may have failed before: then the reason is still that of the write
+        finalName_.Fail(ReasonOfLastFailure());
     }
-    if (!partial.empty()) {
+    if (!partial_.empty()) {
         errno = 0;
-        if (!SyncToDisk(partial.string())) {
-            finalName.Fail(ReasonOfLastFailure());
+        if (!SyncToDisk(partial_.string())) {
+            finalName_.Fail(ReasonOfLastFailure());
         }
-        if (!finalName.Give(partial, ifItExists)) {
+        if (!finalName_.Give(partial_, ifItExists_)) {
             FailAsItExists();
         }
     }
-    committed = true;
+    committed_ = true;
 }
 
 void AtomicFile::FailAsItExists() const {
-    throw ToolFailure(ExitCode::File, finalName.Shown() + " exists already",
+    throw ToolFailure(ExitCode::File, finalName_.Shown() + " exists already",
                       "name a file that does not exist yet");
 }
 

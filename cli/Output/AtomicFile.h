@@ -24,18 +24,18 @@ class AtomicFile final {
     AtomicFile(const AtomicFile&) = delete;
     AtomicFile& operator=(const AtomicFile&) = delete;
 
-    std::ostream& Stream() { return stream; }
+    std::ostream& Stream() { return stream_; }
     /// Returns when the content is on the disk under its name.
     void Commit();
 
   private:
     [[noreturn]] void FailAsItExists() const;
 
-    const FinalName finalName;
-    const IfItExists ifItExists;
-    std::filesystem::path partial;  ///< empty: written directly
-    std::ofstream stream;
-    bool committed = false;
+    const FinalName finalName_;
+    const IfItExists ifItExists_;
+    std::filesystem::path partial_;  ///< empty: written directly
+    std::ofstream stream_;
+    bool committed_ = false;
 };
 
 void WriteFileAtomically(const std::string& name, std::span<const std::uint8_t> content,

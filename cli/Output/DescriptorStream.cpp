@@ -6,14 +6,14 @@
 namespace Varnholt::Cli {
 
 DescriptorStream::DescriptorStream(OutputDescriptor target, const Interruption& userInterruption, Lost lost)
-    : std::ostream(nullptr), buffer(std::move(target), userInterruption, lost) {
-    rdbuf(&buffer);
+    : std::ostream(nullptr), buffer_(std::move(target), userInterruption, lost) {
+    rdbuf(&buffer_);
 }
 
 DescriptorStream::Buffer::Buffer(OutputDescriptor openTarget, const Interruption& userInterruption,
                                  Lost whatIsLost)
-    : target(std::move(openTarget)), interruption(userInterruption), lost(whatIsLost) {
-    setp(room.data(), room.data() + room.size());
+    : target_(std::move(openTarget)), interruption_(userInterruption), lost_(whatIsLost) {
+    setp(room_.data(), room_.data() + room_.size());
 }
 
 DescriptorStream::Buffer::~Buffer() {
@@ -22,8 +22,8 @@ DescriptorStream::Buffer::~Buffer() {
 
 /// How many of them count as written.
 std::size_t DescriptorStream::Buffer::Write(std::span<const char> bytes) {
-    const OutputDescriptor::Outcome outcome = target.Write(bytes, interruption);
-    if (!outcome.error || lost == Lost::IsIgnored) {
+    const OutputDescriptor::Outcome outcome = target_.Write(bytes, interruption_);
+    if (!outcome.error || lost_ == Lost::IsIgnored) {
         return bytes.size();
     }
     errno = outcome.error.value();
@@ -35,7 +35,7 @@ int DescriptorStream::Buffer::sync() {
     const std::size_t written = Write({pbase(), held});
     // What is left stays in front, so that nothing is written twice.
     std::memmove(pbase(), pbase() + written, held - written);
-    setp(room.data(), room.data() + room.size());
+    setp(room_.data(), room_.data() + room_.size());
     pbump(static_cast<int>(held - written));
     return written == held ? 0 : -1;
 }

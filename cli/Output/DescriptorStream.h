@@ -32,13 +32,13 @@ class DescriptorStream final : public std::ostream {
       private:
         std::size_t Write(std::span<const char> bytes);
 
-        OutputDescriptor target;
-        const Interruption& interruption;
-        const Lost lost;
-        std::array<char, 16384> room{};
+        OutputDescriptor target_;
+        const Interruption& interruption_;
+        const Lost lost_;
+        std::array<char, 16384> room_{};
     };
 
-    Buffer buffer;
+    Buffer buffer_;
 };
 
 }  // namespace Varnholt::Cli

@@ -28,17 +28,17 @@ bool RenameIfFree(const Files::path& partial, const Files::path& target, std::er
 
 }  // namespace
 
-FinalName::FinalName(const std::string& name) : shownName(name), target(name) {
+FinalName::FinalName(const std::string& name) : shownName_(name), target_(name) {
     std::error_code error;
-    const Files::file_status status = Files::status(target, error);
-    existed = Files::exists(status);
-    isOrdinary = !existed || Files::is_regular_file(status);
+    const Files::file_status status = Files::status(target_, error);
+    existed_ = Files::exists(status);
+    isOrdinary_ = !existed_ || Files::is_regular_file(status);
     if (Files::is_directory(status)) {
         throw ToolFailure(ExitCode::File, name + " is a directory", "name a file");
     }
-    if (isOrdinary) {
-        if (const Files::path real = Files::canonical(target, error); !error) {
-            target = real;
+    if (isOrdinary_) {
+        if (const Files::path real = Files::canonical(target_, error); !error) {
+            target_ = real;
         }
     }
 }
@@ -46,25 +46,25 @@ FinalName::FinalName(const std::string& name) : shownName(name), target(name) {
 bool FinalName::Give(const Files::path& partial, IfItExists policy) const {
     std::error_code error;
     if (policy == IfItExists::Refuse) {
-        if (!RenameIfFree(partial, target, error)) {
+        if (!RenameIfFree(partial, target_, error)) {
             return false;
         }
     } else {
-        if (Files::exists(target, error)) {
-            Files::permissions(partial, Files::status(target, error).permissions(), error);
+        if (Files::exists(target_, error)) {
+            Files::permissions(partial, Files::status(target_, error).permissions(), error);
         }
-        Files::rename(partial, target, error);
+        Files::rename(partial, target_, error);
     }
     if (error) {
         Fail(error.message());
     }
     // So that the name is on the disk as well; a system that cannot do that to a folder does without.
-    SyncToDisk(target.has_parent_path() ? target.parent_path().string() : ".");
+    SyncToDisk(target_.has_parent_path() ? target_.parent_path().string() : ".");
     return true;
 }
 
 void FinalName::Fail(const std::string& what) const {
-    throw ToolFailure(ExitCode::File, "cannot write " + shownName + ": " + what,
+    throw ToolFailure(ExitCode::File, "cannot write " + shownName_ + ": " + what,
                       "check the folder, its permissions and the free space");
 }
 

@@ -14,13 +14,13 @@ class FinalName final {
     /// A folder is refused.
     explicit FinalName(const std::string& name);
 
-    const std::string& Shown() const { return shownName; }
+    const std::string& Shown() const { return shownName_; }
     /// Through links: a link stays, what it points to is replaced.
-    const std::filesystem::path& Path() const { return target; }
+    const std::filesystem::path& Path() const { return target_; }
     /// False for what can only be written to directly: a device, a pipe.
-    bool CanBeReplaced() const { return isOrdinary; }
+    bool CanBeReplaced() const { return isOrdinary_; }
     /// Whether something had the name when the object was made.
-    bool Existed() const { return existed; }
+    bool Existed() const { return existed_; }
 
     /// `partial`, a closed file in the same folder whose content is on the disk, gets the name, and the
     /// permissions of what had it. False, with nothing changed, where that is refused because something has
@@ -30,10 +30,10 @@ class FinalName final {
     [[noreturn]] void Fail(const std::string& what) const;
 
   private:
-    const std::string shownName;
-    std::filesystem::path target;
-    bool existed;
-    bool isOrdinary;
+    const std::string shownName_;
+    std::filesystem::path target_;
+    bool existed_;
+    bool isOrdinary_;
 };
 
 }  // namespace Varnholt::Cli

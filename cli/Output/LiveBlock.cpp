@@ -8,16 +8,16 @@
 namespace Varnholt::Cli {
 
 std::string LiveBlock::Over(const std::string& lines) {
-    if (!terminal.movesCursor) {
+    if (!terminal_.movesCursor) {
         return lines;
     }
-    const TerminalSize size = terminal.size();
+    const TerminalSize size = terminal_.size();
     std::string lead;
-    if (linesBefore > 0) {
-        lead = size == sizeBefore ? fmt::format("\r\x1b[{}A\x1b[J", linesBefore) : "\x1b[H\x1b[2J";
+    if (linesBefore_ > 0) {
+        lead = size == sizeBefore_ ? fmt::format("\r\x1b[{}A\x1b[J", linesBefore_) : "\x1b[H\x1b[2J";
     }
-    sizeBefore = size;
-    linesBefore = std::count(lines.begin(), lines.end(), '\n');
+    sizeBefore_ = size;
+    linesBefore_ = std::count(lines.begin(), lines.end(), '\n');
     return lead + lines;
 }
 

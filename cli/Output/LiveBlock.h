@@ -10,7 +10,7 @@ namespace Varnholt::Cli {
 /// block below the other.
 class LiveBlock final {
   public:
-    explicit LiveBlock(StreamFacts facts) : terminal(std::move(facts)) {}
+    explicit LiveBlock(StreamFacts facts) : terminal_(std::move(facts)) {}
 
     /// What is to be printed so that `lines`, none of them wider than the terminal and each with its line
     /// end, stand where the block before stood. After a change of the terminal's size, which may have broken
@@ -18,9 +18,9 @@ class LiveBlock final {
     std::string Over(const std::string& lines);
 
   private:
-    const StreamFacts terminal;
-    TerminalSize sizeBefore;
-    std::ptrdiff_t linesBefore = 0;
+    const StreamFacts terminal_;
+    TerminalSize sizeBefore_;
+    std::ptrdiff_t linesBefore_ = 0;
 };
 
 /// `text` broken at blanks into lines of at most `width` characters, each with its line end.

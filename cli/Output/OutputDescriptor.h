@@ -51,11 +51,11 @@ class OutputDescriptor final {
     int WaitingTime(const Interruption& interruption);
     std::error_code AwaitRoom(const Interruption& interruption);
 
-    int descriptor;  ///< -1: closed
-    bool isOwn;
-    bool isFile;
+    int descriptor_;  ///< -1: closed
+    bool isOwn_;
+    bool isFile_;
     /// Till when something is waited for although the user wants to end.
-    std::optional<std::chrono::steady_clock::time_point> patienceEnd;
+    std::optional<std::chrono::steady_clock::time_point> patienceEnd_;
 };
 
 }  // namespace Varnholt::Cli

@@ -45,13 +45,13 @@ bool IsFile(int descriptor) {
 }  // namespace
 
 OutputDescriptor::OutputDescriptor(int openDescriptor, Ownership ownership)
-    : descriptor(openDescriptor), isOwn(ownership == Ownership::Own), isFile(IsFile(openDescriptor)) {}
+    : descriptor_(openDescriptor), isOwn_(ownership == Ownership::Own), isFile_(IsFile(openDescriptor)) {}
 
 OutputDescriptor::OutputDescriptor(OutputDescriptor&& other) noexcept
-    : descriptor(std::exchange(other.descriptor, -1)),
-      isOwn(other.isOwn),
-      isFile(other.isFile),
-      patienceEnd(other.patienceEnd) {}
+    : descriptor_(std::exchange(other.descriptor_, -1)),
+      isOwn_(other.isOwn_),
+      isFile_(other.isFile_),
+      patienceEnd_(other.patienceEnd_) {}
 
 OutputDescriptor::~OutputDescriptor() {
     Close();
@@ -99,10 +99,10 @@ int OutputDescriptor::WaitingTime(const Interruption& interruption) {
         return LookInterval;
     }
     const auto now = std::chrono::steady_clock::now();
-    if (!patienceEnd) {
-        patienceEnd = now + PatienceAtTheEnd;
+    if (!patienceEnd_) {
+        patienceEnd_ = now + PatienceAtTheEnd;
     }
-    const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(*patienceEnd - now).count();
+    const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(*patienceEnd_ - now).count();
     return static_cast<int>(std::clamp<std::int64_t>(left, 0, LookInterval));
 }
 
@@ -110,7 +110,7 @@ int OutputDescriptor::WaitingTime(const Interruption& interruption) {
 std::error_code OutputDescriptor::AwaitRoom(const Interruption& interruption) {
     for (;;) {
         const int waitingTime = WaitingTime(interruption);
-        pollfd waited{descriptor, POLLOUT, 0};
+        pollfd waited{descriptor_, POLLOUT, 0};
         const int ready = ::poll(&waited, 1, waitingTime);
         if (ready > 0) {
             return {};
@@ -127,7 +127,7 @@ std::error_code OutputDescriptor::AwaitRoom(const Interruption& interruption) {
 OutputDescriptor::Outcome OutputDescriptor::Write(std::span<const char> bytes,
                                                   const Interruption& interruption) {
     // A file takes all, and what this object has opened as much as there is room for.
-    const bool neverWaits = isFile || isOwn;
+    const bool neverWaits = isFile_ || isOwn_;
     std::size_t accepted = 0;
     bool wasRefused = false;
     while (accepted < bytes.size()) {
@@ -137,7 +137,7 @@ OutputDescriptor::Outcome OutputDescriptor::Write(std::span<const char> bytes,
             }
         }
         const std::size_t piece = std::min(bytes.size() - accepted, neverWaits ? LargePiece : PipePiece);
-        const ssize_t taken = ::write(descriptor, bytes.data() + accepted, piece);
+        const ssize_t taken = ::write(descriptor_, bytes.data() + accepted, piece);
         if (taken < 0 && errno == EAGAIN) {
             if (wasRefused) {  // a terminal with room for less than a line end
                 if (WaitingTime(interruption) == 0) {
@@ -158,16 +158,16 @@ OutputDescriptor::Outcome OutputDescriptor::Write(std::span<const char> bytes,
 }
 
 std::error_code OutputDescriptor::Cut(std::uint64_t size) {
-    return ::ftruncate(descriptor, static_cast<off_t>(size)) == 0 ? std::error_code() : LastCode();
+    return ::ftruncate(descriptor_, static_cast<off_t>(size)) == 0 ? std::error_code() : LastCode();
 }
 
 std::error_code OutputDescriptor::Sync() {
-    return ::fsync(descriptor) == 0 ? std::error_code() : LastCode();
+    return ::fsync(descriptor_) == 0 ? std::error_code() : LastCode();
 }
 
 std::error_code OutputDescriptor::Close() {
-    const int closed = std::exchange(descriptor, -1);
-    return !isOwn || closed < 0 || ::close(closed) == 0 ? std::error_code() : LastCode();
+    const int closed = std::exchange(descriptor_, -1);
+    return !isOwn_ || closed < 0 || ::close(closed) == 0 ? std::error_code() : LastCode();
 }
 
 }  // namespace Varnholt::Cli

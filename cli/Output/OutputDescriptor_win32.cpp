@@ -27,15 +27,15 @@ bool IsFile(int descriptor) {
 }  // namespace
 
 OutputDescriptor::OutputDescriptor(int openDescriptor, Ownership ownership)
-    : descriptor(openDescriptor),
-      isOwn(ownership == Ownership::Own),
-      isFile(openDescriptor >= 0 && IsFile(openDescriptor)) {}
+    : descriptor_(openDescriptor),
+      isOwn_(ownership == Ownership::Own),
+      isFile_(openDescriptor >= 0 && IsFile(openDescriptor)) {}
 
 OutputDescriptor::OutputDescriptor(OutputDescriptor&& other) noexcept
-    : descriptor(std::exchange(other.descriptor, -1)),
-      isOwn(other.isOwn),
-      isFile(other.isFile),
-      patienceEnd(other.patienceEnd) {}
+    : descriptor_(std::exchange(other.descriptor_, -1)),
+      isOwn_(other.isOwn_),
+      isFile_(other.isFile_),
+      patienceEnd_(other.patienceEnd_) {}
 
 OutputDescriptor::~OutputDescriptor() {
     Close();
@@ -67,14 +67,14 @@ OutputDescriptor::Outcome OutputDescriptor::Write(std::span<const char> bytes,
                                                   const Interruption& interruption) {
     std::size_t accepted = 0;
     while (accepted < bytes.size()) {
-        if (!isFile && accepted > 0) {
+        if (!isFile_ && accepted > 0) {
             // Nothing here tells whether a pipe has room; only what comes next is refused.
             if (interruption.IsRequested()) {
                 return {accepted, std::make_error_code(std::errc::operation_canceled)};
             }
         }
-        const std::size_t piece = std::min(bytes.size() - accepted, isFile ? FilePiece : PipePiece);
-        const int taken = ::_write(descriptor, bytes.data() + accepted, static_cast<unsigned>(piece));
+        const std::size_t piece = std::min(bytes.size() - accepted, isFile_ ? FilePiece : PipePiece);
+        const int taken = ::_write(descriptor_, bytes.data() + accepted, static_cast<unsigned>(piece));
         if (taken < 0) {
             return {accepted, LastCode()};
         }
@@ -87,17 +87,17 @@ OutputDescriptor::Outcome OutputDescriptor::Write(std::span<const char> bytes,
 }
 
 std::error_code OutputDescriptor::Cut(std::uint64_t size) {
-    const int code = ::_chsize_s(descriptor, static_cast<__int64>(size));
+    const int code = ::_chsize_s(descriptor_, static_cast<__int64>(size));
     return {code, std::generic_category()};
 }
 
 std::error_code OutputDescriptor::Sync() {
-    return ::_commit(descriptor) == 0 ? std::error_code() : LastCode();
+    return ::_commit(descriptor_) == 0 ? std::error_code() : LastCode();
 }
 
 std::error_code OutputDescriptor::Close() {
-    const int closed = std::exchange(descriptor, -1);
-    return !isOwn || closed < 0 || ::_close(closed) == 0 ? std::error_code() : LastCode();
+    const int closed = std::exchange(descriptor_, -1);
+    return !isOwn_ || closed < 0 || ::_close(closed) == 0 ? std::error_code() : LastCode();
 }
 
 }  // namespace Varnholt::Cli

@@ -15,10 +15,10 @@ namespace {
 class Raster final {
   public:
     Raster(int dotColumns, int dotRows)
-        : columns(dotColumns), rows(dotRows), dots(static_cast<std::size_t>(dotColumns * dotRows)) {}
+        : columns(dotColumns), rows(dotRows), dots_(static_cast<std::size_t>(dotColumns * dotRows)) {}
 
-    void Set(int column, int row) { dots[IndexOf(column, row)] = true; }
-    bool Get(int column, int row) const { return column < columns && dots[IndexOf(column, row)]; }
+    void Set(int column, int row) { dots_[IndexOf(column, row)] = true; }
+    bool Get(int column, int row) const { return column < columns && dots_[IndexOf(column, row)]; }
 
     const int columns;
     const int rows;
@@ -28,7 +28,7 @@ class Raster final {
         return static_cast<std::size_t>(row * columns + column);
     }
 
-    std::vector<bool> dots;
+    std::vector<bool> dots_;
 };
 
 constexpr int DotColumns = 2;  // of a Braille character

@@ -43,15 +43,16 @@ std::string SizeText(double bytes) {
 
 Progress::Progress(std::ostream& terminal, StreamFacts facts, std::string what, std::uint64_t all,
                    std::string unitText)
-    : stream(terminal),
-      terminalFacts(std::move(facts)),
-      title(std::move(what)),
-      total(all),
-      unit(std::move(unitText)) {}
+    : stream_(terminal),
+      terminalFacts_(std::move(facts)),
+      title_(std::move(what)),
+      total_(all),
+      unit_(std::move(unitText)) {}
 
 Progress::~Progress() {
-    if (drawn > 0) {
-        stream << '\r' + std::string(std::min(drawn, UsableColumns(terminalFacts)), ' ') + '\r' << std::flush;
+    if (drawn_ > 0) {
+        stream_ << '\r' + std::string(std::min(drawn_, UsableColumns(terminalFacts_)), ' ') + '\r'
+                << std::flush;
     }
 }
 
@@ -81,16 +82,16 @@ std::string Progress::LineFor(const std::string& title, std::uint64_t done, std:
 
 void Progress::Update(std::uint64_t done) {
     const Clock::time_point now = Clock::now();
-    if (!terminalFacts.movesCursor || (now < next && (total == 0 || done < total))) {
+    if (!terminalFacts_.movesCursor || (now < next_ && (total_ == 0 || done < total_))) {
         return;
     }
-    next = now + DrawInterval;
-    const std::size_t columns = UsableColumns(terminalFacts);
+    next_ = now + DrawInterval;
+    const std::size_t columns = UsableColumns(terminalFacts_);
     std::string line =
-        LineFor(title, done, total, unit, std::chrono::duration<double>(now - start).count(), columns);
-    drawn = std::max(std::min(drawn, columns), line.size());
-    line.resize(drawn, ' ');  // over what is longer from before
-    stream << '\r' + line << std::flush;
+        LineFor(title_, done, total_, unit_, std::chrono::duration<double>(now - start_).count(), columns);
+    drawn_ = std::max(std::min(drawn_, columns), line.size());
+    line.resize(drawn_, ' ');  // over what is longer from before
+    stream_ << '\r' + line << std::flush;
 }
 
 }  // namespace Varnholt::Cli

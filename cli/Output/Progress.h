@@ -32,14 +32,14 @@ class Progress final {
   private:
     using Clock = std::chrono::steady_clock;
 
-    std::ostream& stream;
-    const StreamFacts terminalFacts;
-    const std::string title;
-    const std::uint64_t total;
-    const std::string unit;
-    const Clock::time_point start = Clock::now();
-    Clock::time_point next = start;
-    std::size_t drawn = 0;  ///< characters on the line
+    std::ostream& stream_;
+    const StreamFacts terminalFacts_;
+    const std::string title_;
+    const std::uint64_t total_;
+    const std::string unit_;
+    const Clock::time_point start_ = Clock::now();
+    Clock::time_point next_ = start_;
+    std::size_t drawn_ = 0;  ///< characters on the line
 };
 
 /// "256 B", "1.3 kB", "52.4 MB"

@@ -31,15 +31,15 @@ std::vector<RecordCsv::Cell> RecordCsv::MakeCells() {
 }
 
 RecordCsv::RecordCsv(std::size_t recordSize, CsvColumns chosenColumns)
-    : size(recordSize),
-      columns(chosenColumns),
-      longestLine(2 * LongestNumber + recordSize / 2 * LongestValue) {}
+    : size_(recordSize),
+      columns_(chosenColumns),
+      longestLine_(2 * LongestNumber + recordSize / 2 * LongestValue) {}
 
 std::string RecordCsv::Head() const {
     std::string head;
-    head += columns.number ? "record," : "";
-    head += columns.seconds ? "seconds," : "";
-    for (std::size_t i = 0; i < size / 2; ++i) {
+    head += columns_.number ? "record," : "";
+    head += columns_.seconds ? "seconds," : "";
+    for (std::size_t i = 0; i < size_ / 2; ++i) {
         head += std::to_string(i) + ',';
     }
     head.back() = '\n';
@@ -48,25 +48,25 @@ std::string RecordCsv::Head() const {
 
 std::span<const char> RecordCsv::Lines(std::span<const std::uint8_t> records, std::uint64_t number,
                                        std::uint64_t milliseconds) {
-    text.resize(std::max(text.size(), records.size() / size * longestLine + sizeof(Cell)));
+    text_.resize(std::max(text_.size(), records.size() / size_ * longestLine_ + sizeof(Cell)));
     const std::string seconds =
-        columns.seconds ? fmt::format("{}.{:03},", milliseconds / 1000, milliseconds % 1000) : "";
-    char* at = text.data();
-    char* const end = at + text.size();
-    for (std::size_t i = 0; i < records.size(); i += size) {
-        if (columns.number) {
+        columns_.seconds ? fmt::format("{}.{:03},", milliseconds / 1000, milliseconds % 1000) : "";
+    char* at = text_.data();
+    char* const end = at + text_.size();
+    for (std::size_t i = 0; i < records.size(); i += size_) {
+        if (columns_.number) {
             at = std::to_chars(at, end, number++).ptr;
             *at++ = ',';
         }
         at = std::copy(seconds.begin(), seconds.end(), at);
-        for (std::size_t j = i; j < i + size; j += 2) {
-            const Cell& cell = cells[Protocol::LoadBig16(records.data() + j)];
+        for (std::size_t j = i; j < i + size_; j += 2) {
+            const Cell& cell = cells_[Protocol::LoadBig16(records.data() + j)];
             std::memcpy(at, &cell, sizeof(cell));  // what is too much is written over
             at += cell.length;
         }
         at[-1] = '\n';
     }
-    return std::span<const char>(text).first(static_cast<std::size_t>(at - text.data()));
+    return std::span<const char>(text_).first(static_cast<std::size_t>(at - text_.data()));
 }
 
 }  // namespace Varnholt::Cli

@@ -37,11 +37,11 @@ class RecordCsv final {
     static_assert(sizeof(Cell) == 8);
     static std::vector<Cell> MakeCells();
 
-    const std::vector<Cell> cells = MakeCells();  ///< of all values, as they travel
-    const std::size_t size;
-    const CsvColumns columns;
-    const std::size_t longestLine;
-    std::vector<char> text;
+    const std::vector<Cell> cells_ = MakeCells();  ///< of all values, as they travel
+    const std::size_t size_;
+    const CsvColumns columns_;
+    const std::size_t longestLine_;
+    std::vector<char> text_;
 };
 
 }  // namespace Varnholt::Cli

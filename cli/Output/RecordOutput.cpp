@@ -9,19 +9,19 @@ namespace Varnholt::Cli {
 void RecordOutput::Append(std::span<const char> block, std::uint64_t blockRecords, Form form) {
     const Taken taken = Take(block);
     if (!taken.error) {
-        wholeBytes += block.size();
-        records += blockRecords;
+        wholeBytes_ += block.size();
+        records_ += blockRecords;
         return;
     }
     if (blockRecords > 0 && form == Form::EqualLength) {
         const std::size_t size = block.size() / static_cast<std::size_t>(blockRecords);
-        records += taken.bytes / size;
-        wholeBytes += taken.bytes / size * size;
+        records_ += taken.bytes / size;
+        wholeBytes_ += taken.bytes / size * size;
     } else if (blockRecords > 0) {
         const auto part = block.first(taken.bytes);
         const auto lastEnd = std::find(part.rbegin(), part.rend(), '\n');
-        records += static_cast<std::uint64_t>(std::count(part.begin(), part.end(), '\n'));
-        wholeBytes += static_cast<std::uint64_t>(part.rend() - lastEnd);
+        records_ += static_cast<std::uint64_t>(std::count(part.begin(), part.end(), '\n'));
+        wholeBytes_ += static_cast<std::uint64_t>(part.rend() - lastEnd);
     }
     if (taken.error == std::errc::operation_canceled) {
         throw ToolFailure(ExitCode::Interrupted, "interrupted");

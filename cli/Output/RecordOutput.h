@@ -23,7 +23,7 @@ class RecordOutput {
     /// block that is taken in part, the whole records count.
     void Append(std::span<const char> block, std::uint64_t records, Form form = Form::EqualLength);
 
-    std::uint64_t Records() const { return records; }
+    std::uint64_t Records() const { return records_; }
 
     /// The end of a measurement that went as it should: returns when everything is where it belongs.
     virtual void Complete() = 0;
@@ -47,11 +47,11 @@ class RecordOutput {
     [[noreturn]] virtual void Fail(std::error_code error) const = 0;
 
     /// Up to the end of the last whole record.
-    std::uint64_t WholeBytes() const { return wholeBytes; }
+    std::uint64_t WholeBytes() const { return wholeBytes_; }
 
   private:
-    std::uint64_t records = 0;
-    std::uint64_t wholeBytes = 0;
+    std::uint64_t records_ = 0;
+    std::uint64_t wholeBytes_ = 0;
 };
 
 }  // namespace Varnholt::Cli

@@ -19,19 +19,24 @@ Files::path PartialFor(const FinalName& name) {
 }  // namespace
 
 RecordingFile::RecordingFile(const std::string& name, const Interruption& userInterruption)
-    : finalName(name), interruption(userInterruption), partial(PartialFor(finalName)), descriptor(Open()) {}
+    : finalName_(name),
+      interruption_(userInterruption),
+      partial_(PartialFor(finalName_)),
+      descriptor_(Open()) {}
 
 OutputDescriptor RecordingFile::Open() {
     std::error_code error;
-    OutputDescriptor opened = partial.empty() ? OutputDescriptor::Open(finalName.Shown(), interruption, error)
-                                              : OutputDescriptor::Create(partial.string(), error);
+    OutputDescriptor opened = partial_.empty()
+                                  ? OutputDescriptor::Open(finalName_.Shown(), interruption_, error)
+                                  : OutputDescriptor::Create(partial_.string(), error);
     if (error == std::errc::file_exists) {
-        throw ToolFailure(ExitCode::File,
-                          partial.string() + " exists: another run writes it, or one that was killed left it",
-                          "it holds what that run recorded; move it away, or remove it, and try again");
+        throw ToolFailure(
+            ExitCode::File,
+            partial_.string() + " exists: another run writes it, or one that was killed left it",
+            "it holds what that run recorded; move it away, or remove it, and try again");
     }
     if (error == std::errc::operation_canceled) {
-        interruption.ThrowIfRequested();
+        interruption_.ThrowIfRequested();
     }
     if (error) {
         Fail(error);
@@ -40,7 +45,7 @@ OutputDescriptor RecordingFile::Open() {
 }
 
 RecordingFile::~RecordingFile() {
-    if (!isOpen) {
+    if (!isOpen_) {
         return;
     }
     try {
@@ -50,23 +55,23 @@ RecordingFile::~RecordingFile() {
 }
 
 RecordOutput::Taken RecordingFile::Take(std::span<const char> block) {
-    const OutputDescriptor::Outcome outcome = descriptor.Write(block, interruption);
+    const OutputDescriptor::Outcome outcome = descriptor_.Write(block, interruption_);
     return {outcome.accepted, outcome.error};
 }
 
 void RecordingFile::Complete() {
-    if (!partial.empty()) {
-        if (const std::error_code error = descriptor.Sync()) {
+    if (!partial_.empty()) {
+        if (const std::error_code error = descriptor_.Sync()) {
             Fail(error);
         }
     }
-    if (const std::error_code error = descriptor.Close()) {
+    if (const std::error_code error = descriptor_.Close()) {
         Fail(error);
     }
-    if (!partial.empty()) {
-        finalName.Give(partial, FinalName::IfItExists::Replace);
+    if (!partial_.empty()) {
+        finalName_.Give(partial_, FinalName::IfItExists::Replace);
     }
-    isOpen = false;
+    isOpen_ = false;
 }
 
 RecordOutput::Remains RecordingFile::KeepWholeRecords() {
@@ -74,38 +79,38 @@ RecordOutput::Remains RecordingFile::KeepWholeRecords() {
         Discard();
         return {};
     }
-    isOpen = false;
-    if (partial.empty()) {
-        return {finalName.Shown(), {}};
+    isOpen_ = false;
+    if (partial_.empty()) {
+        return {finalName_.Shown(), {}};
     }
     // What cannot be cut, synced or renamed is still more than nothing.
-    descriptor.Cut(WholeBytes());
-    descriptor.Sync();
-    descriptor.Close();
-    if (finalName.Existed()) {
-        return {partial.string(), finalName.Shown()};
+    descriptor_.Cut(WholeBytes());
+    descriptor_.Sync();
+    descriptor_.Close();
+    if (finalName_.Existed()) {
+        return {partial_.string(), finalName_.Shown()};
     }
     try {
-        if (finalName.Give(partial, FinalName::IfItExists::Refuse)) {
-            return {finalName.Shown(), {}};
+        if (finalName_.Give(partial_, FinalName::IfItExists::Refuse)) {
+            return {finalName_.Shown(), {}};
         }
-        return {partial.string(), finalName.Shown()};  // somebody was faster
+        return {partial_.string(), finalName_.Shown()};  // somebody was faster
     } catch (const ToolFailure&) {
-        return {partial.string(), {}};
+        return {partial_.string(), {}};
     }
 }
 
 void RecordingFile::Discard() {
-    isOpen = false;
-    descriptor.Close();
-    if (!partial.empty()) {
+    isOpen_ = false;
+    descriptor_.Close();
+    if (!partial_.empty()) {
         std::error_code ignored;
-        Files::remove(partial, ignored);
+        Files::remove(partial_, ignored);
     }
 }
 
 void RecordingFile::Fail(std::error_code error) const {
-    finalName.Fail(error.message());
+    finalName_.Fail(error.message());
 }
 
 }  // namespace Varnholt::Cli

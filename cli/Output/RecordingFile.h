@@ -29,11 +29,11 @@ class RecordingFile final : public RecordOutput {
     [[noreturn]] void Fail(std::error_code error) const override;
     OutputDescriptor Open();
 
-    const FinalName finalName;
-    const Interruption& interruption;
-    const std::filesystem::path partial;  ///< empty: written directly
-    OutputDescriptor descriptor;
-    bool isOpen = true;
+    const FinalName finalName_;
+    const Interruption& interruption_;
+    const std::filesystem::path partial_;  ///< empty: written directly
+    OutputDescriptor descriptor_;
+    bool isOpen_ = true;
 };
 
 }  // namespace Varnholt::Cli

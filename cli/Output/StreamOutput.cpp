@@ -13,16 +13,16 @@ RecordOutput::Taken StreamOutput::Take(std::span<const char> block) {
         return Taken{taken, {errno != 0 ? errno : EIO, std::generic_category()}};
     };
     errno = 0;
-    if (!stream.flush()) {
+    if (!stream_.flush()) {
         return failed(0);
     }
     const auto taken = static_cast<std::size_t>(
-        stream.rdbuf()->sputn(block.data(), static_cast<std::streamsize>(block.size())));
+        stream_.rdbuf()->sputn(block.data(), static_cast<std::streamsize>(block.size())));
     if (taken < block.size()) {
-        stream.setstate(std::ios::badbit);
+        stream_.setstate(std::ios::badbit);
         return failed(taken);
     }
-    return stream.flush() ? Taken{taken, {}} : failed(0);
+    return stream_.flush() ? Taken{taken, {}} : failed(0);
 }
 
 void StreamOutput::Fail(std::error_code error) const {

@@ -10,7 +10,7 @@ namespace Varnholt::Cli {
 class StreamOutput final : public RecordOutput {
   public:
     /// Not owned.
-    explicit StreamOutput(std::ostream& usedStream) : stream(usedStream) {}
+    explicit StreamOutput(std::ostream& usedStream) : stream_(usedStream) {}
 
     void Complete() override {}
     Remains KeepWholeRecords() override { return {}; }
@@ -20,7 +20,7 @@ class StreamOutput final : public RecordOutput {
     Taken Take(std::span<const char> block) override;
     [[noreturn]] void Fail(std::error_code error) const override;
 
-    std::ostream& stream;
+    std::ostream& stream_;
 };
 
 }  // namespace Varnholt::Cli

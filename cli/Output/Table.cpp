@@ -17,20 +17,20 @@ std::size_t WidthOf(const std::string& text) {
 }  // namespace
 
 void Table::AddRow(std::vector<std::string> cells) {
-    cells.resize(columns.size());
-    rows.push_back(std::move(cells));
+    cells.resize(columns_.size());
+    rows_.push_back(std::move(cells));
 }
 
 void Table::Print(std::ostream& stream) const {
     std::vector<std::size_t> widths;
     std::vector<std::string> titles;
     bool hasHead = false;
-    for (const Column& column : columns) {
+    for (const Column& column : columns_) {
         widths.push_back(WidthOf(column.title));
         titles.push_back(column.title);
         hasHead = hasHead || !column.title.empty();
     }
-    for (const auto& row : rows) {
+    for (const auto& row : rows_) {
         for (std::size_t i = 0; i < row.size(); ++i) {
             widths[i] = std::max(widths[i], WidthOf(row[i]));
         }
@@ -39,7 +39,7 @@ void Table::Print(std::ostream& stream) const {
         std::string line;
         for (std::size_t i = 0; i < cells.size(); ++i) {
             const std::string padding(widths[i] - WidthOf(cells[i]), ' ');
-            line += columns[i].align == Align::Right ? padding + cells[i] : cells[i] + padding;
+            line += columns_[i].align == Align::Right ? padding + cells[i] : cells[i] + padding;
             line.append(Gap, ' ');
         }
         line.erase(line.find_last_not_of(' ') + 1);
@@ -48,7 +48,7 @@ void Table::Print(std::ostream& stream) const {
     if (hasHead) {
         printRow(titles);
     }
-    for (const auto& row : rows) {
+    for (const auto& row : rows_) {
         printRow(row);
     }
 }

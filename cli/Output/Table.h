@@ -15,17 +15,17 @@ class Table final {
         Align align = Align::Left;
     };
 
-    explicit Table(std::vector<Column> tableColumns) : columns(std::move(tableColumns)) {}
+    explicit Table(std::vector<Column> tableColumns) : columns_(std::move(tableColumns)) {}
 
     /// Missing cells are empty; cells beyond the columns are dropped.
     void AddRow(std::vector<std::string> cells);
-    bool IsEmpty() const { return rows.empty(); }
+    bool IsEmpty() const { return rows_.empty(); }
     /// No line ends with blanks.
     void Print(std::ostream& stream) const;
 
   private:
-    const std::vector<Column> columns;
-    std::vector<std::vector<std::string>> rows;
+    const std::vector<Column> columns_;
+    std::vector<std::vector<std::string>> rows_;
 };
 
 }  // namespace Varnholt::Cli

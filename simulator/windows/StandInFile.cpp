@@ -26,13 +26,14 @@ class StandInFileObject::Running final : public Platform::Usb::TransferClient {
     }
 
     void TransferCompleted(Transfer& completed) noexcept override {
-        if (completed.status == Platform::Usb::TransferStatus::Cancelled && file->instrument->IsUnplugged()) {
+        if (completed.status == Platform::Usb::TransferStatus::Cancelled &&
+            file->instrument_->IsUnplugged()) {
             completed.status = Platform::Usb::TransferStatus::DeviceGone;
         }
-        file->driver->Device().Learn(completed);
+        file->driver_->Device().Learn(completed);
         const bool wasGivenUp = givenUp && completed.status == Platform::Usb::TransferStatus::Cancelled;
-        file->Ended(*this, KernelStatus(wasGivenUp ? file->driver->TimedOutCode()
-                                                   : file->driver->OutcomeOf(completed.status)));
+        file->Ended(*this, KernelStatus(wasGivenUp ? file->driver_->TimedOutCode()
+                                                   : file->driver_->OutcomeOf(completed.status)));
     }
 
     Transfer transfer;
@@ -43,12 +44,12 @@ class StandInFileObject::Running final : public Platform::Usb::TransferClient {
 
 StandInFileObject::StandInFileObject(std::shared_ptr<StandInInstrumentObject> opened,
                                      std::unique_ptr<Platform::Drivers::DriverFile> file)
-    : instrument(std::move(opened)), driver(std::move(file)) {
-    instrument->Add(*this);
+    : instrument_(std::move(opened)), driver_(std::move(file)) {
+    instrument_->Add(*this);
 }
 
 StandInFileObject::~StandInFileObject() {
-    instrument->Remove(*this);
+    instrument_->Remove(*this);
 }
 
 Status StandInFileObject::Read(std::span<std::uint8_t> buffer, const StandInRequest& request,
@@ -56,7 +57,7 @@ Status StandInFileObject::Read(std::span<std::uint8_t> buffer, const StandInRequ
     const auto running = std::make_shared<Running>(shared_from_this(), request);
     running->transfer.data = buffer.data();
     running->transfer.length = static_cast<std::uint32_t>(buffer.size());
-    return Start(driver->Read(running->transfer), running, bytes);
+    return Start(driver_->Read(running->transfer), running, bytes);
 }
 
 Status StandInFileObject::Write(std::span<const std::uint8_t> data, const StandInRequest& request,
@@ -65,7 +66,7 @@ Status StandInFileObject::Write(std::span<const std::uint8_t> data, const StandI
     // A transfer has one buffer for both directions; that of a write is only read.
     running->transfer.data = const_cast<std::uint8_t*>(data.data());
     running->transfer.length = static_cast<std::uint32_t>(data.size());
-    return Start(driver->Write(running->transfer), running, bytes);
+    return Start(driver_->Write(running->transfer), running, bytes);
 }
 
 Status StandInFileObject::Control(std::uint32_t code, std::span<const std::uint8_t> input,
@@ -77,10 +78,10 @@ Status StandInFileObject::Control(std::uint32_t code, std::span<const std::uint8
     // With the buffered method, input and output are one buffer.
     const std::vector<std::uint8_t> copiedInput(input.begin(), input.end());
     const auto running = std::make_shared<Running>(shared_from_this(), request);
-    const Decision decision = driver->Control(code, copiedInput, output, running->transfer);
+    const Decision decision = driver_->Control(code, copiedInput, output, running->transfer);
     if (code == Protocol::UsbIoDriver::Control::GetDriverInfo && decision.kind == Decision::Kind::Done &&
         output.size() >= 2) {
-        Protocol::StoreLittle16(output.data(), instrument->interfaceVersion);
+        Protocol::StoreLittle16(output.data(), instrument_->interfaceVersion);
     }
     return Start(decision, running, bytes);
 }
@@ -92,21 +93,21 @@ Status StandInFileObject::Start(const Decision& decision, const std::shared_ptr<
         return KernelStatus(decision.code);
     }
     {
-        const std::lock_guard held(lock);
-        requests.emplace(running->request.number, running);
+        const std::lock_guard held(lock_);
+        requests_.emplace(running->request.number, running);
     }
     LimitTime(*running);
     running->request.pending(running->request.packet);
-    const Platform::ErrorCode refusal = driver->Device().Submit(running->transfer);
+    const Platform::ErrorCode refusal = driver_->Device().Submit(running->transfer);
     if (refusal != Platform::Errors::Success) {
         running->transfer.actualLength = 0;
-        Ended(*running, KernelStatus(driver->RefusalOf(refusal)));
+        Ended(*running, KernelStatus(driver_->RefusalOf(refusal)));
     }
     return StatusPending;
 }
 
 void StandInFileObject::LimitTime(const Running& running) {
-    const std::uint32_t limit = driver->TimeLimitOf(running.transfer);
+    const std::uint32_t limit = driver_->TimeLimitOf(running.transfer);
     if (limit == 0) {
         return;
     }
@@ -125,10 +126,10 @@ void StandInFileObject::LimitTime(const Running& running) {
 void StandInFileObject::Ended(Running& running, Status status) {
     std::shared_ptr<Running> keptToTheEnd;
     {
-        const std::lock_guard held(lock);
-        const auto found = requests.find(running.request.number);
+        const std::lock_guard held(lock_);
+        const auto found = requests_.find(running.request.number);
         keptToTheEnd = std::move(found->second);
-        requests.erase(found);
+        requests_.erase(found);
     }
     running.request.completed(running.request.packet, status, running.transfer.actualLength);
 }
@@ -137,15 +138,15 @@ template <class Matches>
 void StandInFileObject::CancelThose(Matches matches) {
     std::vector<std::shared_ptr<Running>> found;
     {
-        const std::lock_guard held(lock);
-        for (const auto& [number, running] : requests) {
+        const std::lock_guard held(lock_);
+        for (const auto& [number, running] : requests_) {
             if (matches(number, *running)) {
                 found.push_back(running);
             }
         }
     }
     for (const auto& running : found) {
-        driver->Device().Cancel(running->transfer);
+        driver_->Device().Cancel(running->transfer);
     }
 }
 
@@ -164,7 +165,7 @@ void StandInFileObject::CancelAll() {
 
 std::optional<Status> StandInFileObject::TestControl(std::uint32_t code, std::span<const std::uint8_t> input,
                                                      std::span<std::uint8_t> output, unsigned long& bytes) {
-    SimulatedInstrument& simulated = instrument->Simulated();
+    SimulatedInstrument& simulated = instrument_->Simulated();
     const auto answer = [&](const void* data, std::size_t size) {
         bytes = static_cast<unsigned long>(std::min(size, output.size()));
         std::memcpy(output.data(), data, bytes);
@@ -176,7 +177,7 @@ std::optional<Status> StandInFileObject::TestControl(std::uint32_t code, std::sp
             break;
         case TestControls::SetFaults:
             try {
-                instrument->SetFaults(std::string(input.begin(), input.end()));
+                instrument_->SetFaults(std::string(input.begin(), input.end()));
             } catch (const std::invalid_argument&) {
                 return KernelStatus(Platform::Errors::InvalidParameter);
             }
@@ -185,10 +186,10 @@ std::optional<Status> StandInFileObject::TestControl(std::uint32_t code, std::sp
             if (input.size() != 2) {
                 return KernelStatus(Platform::Errors::InvalidParameter);
             }
-            instrument->interfaceVersion = Protocol::LoadLittle16(input.data());
+            instrument_->interfaceVersion = Protocol::LoadLittle16(input.data());
             break;
         case TestControls::UseElsewhere:
-            instrument->UseElsewhere();
+            instrument_->UseElsewhere();
             break;
         case TestControls::ReadEeprom: {
             const std::vector<std::uint8_t> content = simulated.Eeprom();
@@ -207,7 +208,7 @@ std::optional<Status> StandInFileObject::TestControl(std::uint32_t code, std::sp
                                             static_cast<std::uint32_t>(commands.buttonReports), 0, 0};
             });
             auto full = counts;
-            full.openFiles = static_cast<std::uint32_t>(instrument->OpenFiles());
+            full.openFiles = static_cast<std::uint32_t>(instrument_->OpenFiles());
             full.pendingTransfers = static_cast<std::uint32_t>(simulated.PendingTransfers());
             answer(&full, sizeof full);
             break;

@@ -44,10 +44,10 @@ class StandInFileObject final : public std::enable_shared_from_this<StandInFileO
     template <class Matches>
     void CancelThose(Matches matches);
 
-    const std::shared_ptr<StandInInstrumentObject> instrument;
-    const std::unique_ptr<Platform::Drivers::DriverFile> driver;
-    std::mutex lock;
-    std::map<unsigned long, std::shared_ptr<Running>> requests;  // guarded by lock
+    const std::shared_ptr<StandInInstrumentObject> instrument_;
+    const std::unique_ptr<Platform::Drivers::DriverFile> driver_;
+    std::mutex lock_;
+    std::map<unsigned long, std::shared_ptr<Running>> requests_;  // guarded by lock
 };
 
 }  // namespace Varnholt::Simulator

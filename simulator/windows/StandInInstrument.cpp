@@ -43,15 +43,15 @@ InstrumentSettings SettingsOf(unsigned long index) {
 }  // namespace
 
 StandInInstrumentObject::StandInInstrumentObject(unsigned long index)
-    : name("stand-in-" + std::to_string(index)) {
-    Bus().Add(name, SettingsOf(index));
+    : name_("stand-in-" + std::to_string(index)) {
+    Bus().Add(name_, SettingsOf(index));
 }
 
 StandInInstrumentObject::~StandInInstrumentObject() = default;
 
 void StandInInstrumentObject::Unplug() {
-    unplugged = true;
-    Bus().Unplug(name);
+    unplugged_ = true;
+    Bus().Unplug(name_);
     // A fault can keep a transfer from the instrument, which then does not end it.
     for (const auto& file : Files()) {
         file->CancelAll();
@@ -60,43 +60,43 @@ void StandInInstrumentObject::Unplug() {
 
 std::unique_ptr<Drivers::DriverFile> StandInInstrumentObject::Open(bool usbIo, std::uint32_t pipe,
                                                                    Platform::ErrorCode& error) {
-    const std::lock_guard held(lock);
-    std::shared_ptr<Drivers::SharedDevice> shared = device.lock();
-    if (!shared && usedElsewhere && !otherUser) {
-        otherUser = Bus().Open(name, error);
-        if (otherUser) {
-            otherUser->Claim();
+    const std::lock_guard held(lock_);
+    std::shared_ptr<Drivers::SharedDevice> shared = device_.lock();
+    if (!shared && usedElsewhere_ && !otherUser_) {
+        otherUser_ = Bus().Open(name_, error);
+        if (otherUser_) {
+            otherUser_->Claim();
         }
     }
     if (!shared) {
-        shared = std::make_shared<Drivers::SharedDevice>(Bus(), name);
-        device = shared;
-        usbIoDevice.reset();
+        shared = std::make_shared<Drivers::SharedDevice>(Bus(), name_);
+        device_ = shared;
+        usbIoDevice_.reset();
     }
     if (!usbIo) {
         return Drivers::NativeDriverFile::Open(std::move(shared), pipe, *this, error);
     }
-    std::shared_ptr<Drivers::UsbIoDevice> opened = usbIoDevice.lock();
+    std::shared_ptr<Drivers::UsbIoDevice> opened = usbIoDevice_.lock();
     if (!opened) {
         opened = std::make_shared<Drivers::UsbIoDevice>(std::move(shared));
-        usbIoDevice = opened;
+        usbIoDevice_ = opened;
     }
     return std::make_unique<Drivers::UsbIoDriverFile>(std::move(opened), *this);
 }
 
 void StandInInstrumentObject::Add(StandInFileObject& file) {
-    const std::lock_guard held(lock);
-    files.insert(&file);
+    const std::lock_guard held(lock_);
+    files_.insert(&file);
 }
 
 void StandInInstrumentObject::Remove(StandInFileObject& file) {
-    const std::lock_guard held(lock);
-    files.erase(&file);
+    const std::lock_guard held(lock_);
+    files_.erase(&file);
 }
 
 std::size_t StandInInstrumentObject::OpenFiles() {
-    const std::lock_guard held(lock);
-    return files.size();
+    const std::lock_guard held(lock_);
+    return files_.size();
 }
 
 void StandInInstrumentObject::CancelEndpoint(const Drivers::SharedDevice&, std::uint8_t endpoint) {
@@ -107,8 +107,8 @@ void StandInInstrumentObject::CancelEndpoint(const Drivers::SharedDevice&, std::
 
 std::vector<std::shared_ptr<StandInFileObject>> StandInInstrumentObject::Files() {
     std::vector<std::shared_ptr<StandInFileObject>> open;
-    const std::lock_guard held(lock);
-    for (StandInFileObject* file : files) {
+    const std::lock_guard held(lock_);
+    for (StandInFileObject* file : files_) {
         if (auto living = file->weak_from_this().lock()) {
             open.push_back(std::move(living));
         }
@@ -117,7 +117,7 @@ std::vector<std::shared_ptr<StandInFileObject>> StandInInstrumentObject::Files()
 }
 
 SimulatedInstrument& StandInInstrumentObject::Simulated() {
-    return Bus().Instrument(name);
+    return Bus().Instrument(name_);
 }
 
 std::string StandInInstrumentObject::TakeTranscript() {
@@ -127,7 +127,7 @@ std::string StandInInstrumentObject::TakeTranscript() {
 }
 
 void StandInInstrumentObject::SetFaults(const std::string& plan) {
-    Bus().SetFaults(name, FaultPlan::Parse(plan));
+    Bus().SetFaults(name_, FaultPlan::Parse(plan));
 }
 
 }  // namespace Varnholt::Simulator

@@ -25,7 +25,7 @@ class StandInInstrumentObject final : public Platform::Drivers::EndpointCancelle
     ~StandInInstrumentObject() override;
 
     void Unplug();
-    bool IsUnplugged() const { return unplugged; }
+    bool IsUnplugged() const { return unplugged_; }
 
     /// What the driver makes of an opening; null with the code in `error`.
     std::unique_ptr<Platform::Drivers::DriverFile> Open(bool usbIo, std::uint32_t pipe,
@@ -40,22 +40,22 @@ class StandInInstrumentObject final : public Platform::Drivers::EndpointCancelle
     void SetFaults(const std::string& plan);
     static std::string TakeTranscript();
     /// For good, from the next opening of a device that is not open.
-    void UseElsewhere() { usedElsewhere = true; }
-    bool IsUsedElsewhere() const { return usedElsewhere; }
+    void UseElsewhere() { usedElsewhere_ = true; }
+    bool IsUsedElsewhere() const { return usedElsewhere_; }
 
     std::atomic<std::uint16_t> interfaceVersion = Protocol::UsbIoDriver::InterfaceVersion;
 
   private:
     std::vector<std::shared_ptr<StandInFileObject>> Files();
 
-    const std::string name;
-    std::atomic<bool> unplugged = false;
-    std::atomic<bool> usedElsewhere = false;
-    std::mutex lock;  // guards what follows
-    std::set<StandInFileObject*> files;
-    std::weak_ptr<Platform::Drivers::SharedDevice> device;
-    std::weak_ptr<Platform::Drivers::UsbIoDevice> usbIoDevice;
-    std::shared_ptr<Platform::Usb::UsbDevice> otherUser;
+    const std::string name_;
+    std::atomic<bool> unplugged_ = false;
+    std::atomic<bool> usedElsewhere_ = false;
+    std::mutex lock_;  // guards what follows
+    std::set<StandInFileObject*> files_;
+    std::weak_ptr<Platform::Drivers::SharedDevice> device_;
+    std::weak_ptr<Platform::Drivers::UsbIoDevice> usbIoDevice_;
+    std::shared_ptr<Platform::Usb::UsbDevice> otherUser_;
 };
 
 }  // namespace Varnholt::Simulator

@@ -9,12 +9,12 @@ DeviceFileSystem& DeviceFiles() {
     return replacement ? *replacement : SystemDeviceFiles();
 }
 
-ScopedDeviceFiles::ScopedDeviceFiles(DeviceFileSystem& fileSystem) : previous(replacement) {
+ScopedDeviceFiles::ScopedDeviceFiles(DeviceFileSystem& fileSystem) : previous_(replacement) {
     replacement = &fileSystem;
 }
 
 ScopedDeviceFiles::~ScopedDeviceFiles() {
-    replacement = previous;
+    replacement = previous_;
 }
 
 }  // namespace Varnholt::Platform

@@ -77,7 +77,7 @@ class ScopedDeviceFiles final {
     ScopedDeviceFiles& operator=(const ScopedDeviceFiles&) = delete;
 
   private:
-    DeviceFileSystem* const previous;
+    DeviceFileSystem* const previous_;
 };
 
 /// For `DeviceFiles`: the implementation's own file system.

@@ -16,16 +16,16 @@ template <class List>
 class DeviceListTable final {
   public:
     DeviceList Add(std::shared_ptr<List> list) {
-        const std::lock_guard held(lock);
-        lists.emplace(++last, std::move(list));
-        return reinterpret_cast<DeviceList>(last);
+        const std::lock_guard held(lock_);
+        lists_.emplace(++last_, std::move(list));
+        return reinterpret_cast<DeviceList>(last_);
     }
 
     /// Null, with the error code set, for a list that is not there.
     std::shared_ptr<List> Find(DeviceList list) {
-        const std::lock_guard held(lock);
-        const auto found = lists.find(reinterpret_cast<std::uintptr_t>(list));
-        if (found == lists.end()) {
+        const std::lock_guard held(lock_);
+        const auto found = lists_.find(reinterpret_cast<std::uintptr_t>(list));
+        if (found == lists_.end()) {
             SetLastError(Errors::InvalidHandle);
             return nullptr;
         }
@@ -36,16 +36,16 @@ class DeviceListTable final {
     std::shared_ptr<List> Remove(DeviceList list) {
         std::shared_ptr<List> removed = Find(list);
         if (removed) {
-            const std::lock_guard held(lock);
-            lists.erase(reinterpret_cast<std::uintptr_t>(list));
+            const std::lock_guard held(lock_);
+            lists_.erase(reinterpret_cast<std::uintptr_t>(list));
         }
         return removed;
     }
 
   private:
-    std::mutex lock;
-    std::map<std::uintptr_t, std::shared_ptr<List>> lists;  // guarded by `lock`
-    std::uintptr_t last = 0;                                // guarded by `lock`
+    std::mutex lock_;
+    std::map<std::uintptr_t, std::shared_ptr<List>> lists_;  // guarded by `lock`
+    std::uintptr_t last_ = 0;                                // guarded by `lock`
 };
 
 }  // namespace Varnholt::Platform

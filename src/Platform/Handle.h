@@ -22,26 +22,26 @@ bool Close(Handle handle);
 class OwnedHandle final {
   public:
     OwnedHandle() = default;
-    explicit OwnedHandle(Handle owned) : handle(owned) {}
-    OwnedHandle(OwnedHandle&& other) noexcept : handle(std::exchange(other.handle, NoHandle)) {}
+    explicit OwnedHandle(Handle owned) : handle_(owned) {}
+    OwnedHandle(OwnedHandle&& other) noexcept : handle_(std::exchange(other.handle_, NoHandle)) {}
     OwnedHandle& operator=(OwnedHandle&& other) noexcept {
-        std::swap(handle, other.handle);
+        std::swap(handle_, other.handle_);
         return *this;
     }
     ~OwnedHandle() { Reset(); }
 
-    Handle Get() const { return handle; }
-    explicit operator bool() const { return handle != NoHandle; }
+    Handle Get() const { return handle_; }
+    explicit operator bool() const { return handle_ != NoHandle; }
     /// The handle is the caller's from here on.
-    Handle Release() { return std::exchange(handle, NoHandle); }
+    Handle Release() { return std::exchange(handle_, NoHandle); }
     void Reset() {
-        if (handle != NoHandle) {
+        if (handle_ != NoHandle) {
             Close(Release());
         }
     }
 
   private:
-    Handle handle = NoHandle;
+    Handle handle_ = NoHandle;
 };
 
 }  // namespace Varnholt::Platform

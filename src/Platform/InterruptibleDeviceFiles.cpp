@@ -35,13 +35,13 @@ std::uint8_t EndpointOfNativePipe(std::uint32_t pipe) {
 
 }  // namespace
 
-InterruptibleDeviceFiles::InterruptibleDeviceFiles(DeviceFileSystem& underlying) : below(underlying) {}
+InterruptibleDeviceFiles::InterruptibleDeviceFiles(DeviceFileSystem& underlying) : below_(underlying) {}
 
 void InterruptibleDeviceFiles::Interrupt() {
-    const CriticalSection::Holder holder(section);
-    interrupted = true;
+    const CriticalSection::Holder holder(section_);
+    interrupted_ = true;
     std::vector<Handle> busy;
-    for (const RunningTransfer& transfer : running) {
+    for (const RunningTransfer& transfer : running_) {
         if (std::find(busy.begin(), busy.end(), transfer.file) == busy.end()) {
             busy.push_back(transfer.file);
         }
@@ -52,14 +52,14 @@ void InterruptibleDeviceFiles::Interrupt() {
 }
 
 void InterruptibleDeviceFiles::Resume() {
-    interrupted = false;
+    interrupted_ = false;
 }
 
 const std::string& InterruptibleDeviceFiles::PathOf(Handle file) const {
     static const std::string none;
-    const auto found = std::find_if(files.begin(), files.end(),
+    const auto found = std::find_if(files_.begin(), files_.end(),
                                     [file](const OpenedFile& opened) { return opened.handle == file; });
-    return found == files.end() ? none : found->path;
+    return found == files_.end() ? none : found->path;
 }
 
 void InterruptibleDeviceFiles::AbortPipe(Handle file) {
@@ -71,9 +71,9 @@ void InterruptibleDeviceFiles::AbortPipe(Handle file) {
     }
     const std::string device =
         path.substr(0, path.size() - 1 - std::string(Protocol::NativeDriver::PipeSuffix).size());
-    const auto owner = std::find_if(files.begin(), files.end(),
+    const auto owner = std::find_if(files_.begin(), files_.end(),
                                     [&device](const OpenedFile& opened) { return opened.path == device; });
-    if (owner == files.end()) {
+    if (owner == files_.end()) {
         return;
     }
     Protocol::NativeDriver::ControlBlock block{};
@@ -91,33 +91,33 @@ void InterruptibleDeviceFiles::Control(Handle file, std::uint32_t code, const vo
     }
     Overlapped record;
     record.event = event.Get();
-    if (below.StartControl(file, code, input, inputSize, nullptr, 0, record) ||
+    if (below_.StartControl(file, code, input, inputSize, nullptr, 0, record) ||
         LastError() != Errors::IoPending) {
         return;
     }
     Wait(event.Get(), AbortLimit);
     std::uint32_t transferred = 0;
-    if (!below.GetResult(file, record, transferred, false) && LastError() == Errors::IoIncomplete) {
-        below.CancelTransfers(file);
-        below.GetResult(file, record, transferred, true);
+    if (!below_.GetResult(file, record, transferred, false) && LastError() == Errors::IoIncomplete) {
+        below_.CancelTransfers(file);
+        below_.GetResult(file, record, transferred, true);
     }
 }
 
 std::vector<std::string> InterruptibleDeviceFiles::ListInterfaces(const Protocol::Guid& interfaceClass) {
-    return below.ListInterfaces(interfaceClass);
+    return below_.ListInterfaces(interfaceClass);
 }
 
 Handle InterruptibleDeviceFiles::Open(const std::string& path) {
-    const Handle file = below.Open(path);
+    const Handle file = below_.Open(path);
     if (file == InvalidHandle()) {
         return file;
     }
     try {
-        const CriticalSection::Holder holder(section);
-        files.push_back({file, path});
+        const CriticalSection::Holder holder(section_);
+        files_.push_back({file, path});
         return file;
     } catch (const std::bad_alloc&) {
-        below.CloseFile(file);
+        below_.CloseFile(file);
         SetLastError(Errors::NotEnoughMemory);
         return InvalidHandle();
     }
@@ -125,11 +125,11 @@ Handle InterruptibleDeviceFiles::Open(const std::string& path) {
 
 bool InterruptibleDeviceFiles::CloseFile(Handle file) {
     {
-        const CriticalSection::Holder holder(section);
-        std::erase_if(files, [file](const OpenedFile& opened) { return opened.handle == file; });
-        std::erase_if(running, [file](const RunningTransfer& transfer) { return transfer.file == file; });
+        const CriticalSection::Holder holder(section_);
+        std::erase_if(files_, [file](const OpenedFile& opened) { return opened.handle == file; });
+        std::erase_if(running_, [file](const RunningTransfer& transfer) { return transfer.file == file; });
     }
-    return below.CloseFile(file);
+    return below_.CloseFile(file);
 }
 
 bool InterruptibleDeviceFiles::Refuse(Overlapped& record, ErrorCode code) {
@@ -145,16 +145,17 @@ bool InterruptibleDeviceFiles::Refuse(Overlapped& record, ErrorCode code) {
 /// The section is held over the start, so that no transfer slips in behind an interruption.
 template <class Start>
 bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, Start start) try {
-    const CriticalSection::Holder holder(section);
-    if (interrupted) {
+    const CriticalSection::Holder holder(section_);
+    if (interrupted_) {
         return Refuse(record, Errors::OperationAborted);
     }
-    std::erase_if(running, [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
-    running.push_back({&record, file});
+    std::erase_if(running_,
+                  [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
+    running_.push_back({&record, file});
     const bool completed = start();
     if (!completed && LastError() != Errors::IoPending) {
         const ErrorCode code = LastError();
-        running.pop_back();
+        running_.pop_back();
         SetLastError(code);
     }
     return completed;
@@ -164,32 +165,32 @@ bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, St
 
 bool InterruptibleDeviceFiles::StartRead(Handle file, void* buffer, std::uint32_t length,
                                          Overlapped& record) {
-    return StartTransfer(file, record, [&] { return below.StartRead(file, buffer, length, record); });
+    return StartTransfer(file, record, [&] { return below_.StartRead(file, buffer, length, record); });
 }
 
 bool InterruptibleDeviceFiles::StartWrite(Handle file, const void* buffer, std::uint32_t length,
                                           Overlapped& record) {
-    return StartTransfer(file, record, [&] { return below.StartWrite(file, buffer, length, record); });
+    return StartTransfer(file, record, [&] { return below_.StartWrite(file, buffer, length, record); });
 }
 
 bool InterruptibleDeviceFiles::StartControl(Handle file, std::uint32_t code, const void* input,
                                             std::uint32_t inputSize, void* output, std::uint32_t outputSize,
                                             Overlapped& record) {
     // A control is short and has no pipe that could be aborted; it ends by itself.
-    return interrupted ? Refuse(record, Errors::OperationAborted)
-                       : below.StartControl(file, code, input, inputSize, output, outputSize, record);
+    return interrupted_ ? Refuse(record, Errors::OperationAborted)
+                        : below_.StartControl(file, code, input, inputSize, output, outputSize, record);
 }
 
 bool InterruptibleDeviceFiles::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred,
                                          bool wait) {
-    const bool succeeded = below.GetResult(file, record, transferred, wait);
+    const bool succeeded = below_.GetResult(file, record, transferred, wait);
     const ErrorCode code = LastError();
     if (!succeeded && code == Errors::IoIncomplete) {
         return false;
     }
     {
-        const CriticalSection::Holder holder(section);
-        std::erase_if(running,
+        const CriticalSection::Holder holder(section_);
+        std::erase_if(running_,
                       [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
     }
     SetLastError(code);
@@ -197,7 +198,7 @@ bool InterruptibleDeviceFiles::GetResult(Handle file, Overlapped& record, std::u
 }
 
 bool InterruptibleDeviceFiles::CancelTransfers(Handle file) {
-    return below.CancelTransfers(file);
+    return below_.CancelTransfers(file);
 }
 
 }  // namespace Varnholt::Platform

@@ -31,7 +31,7 @@ class InterruptibleDeviceFiles final : public DeviceFileSystem {
     void Interrupt();
     /// Transfers may start again.
     void Resume();
-    bool IsInterrupted() const { return interrupted.load(); }
+    bool IsInterrupted() const { return interrupted_.load(); }
 
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
     Handle Open(const std::string& path) override;
@@ -60,12 +60,12 @@ class InterruptibleDeviceFiles final : public DeviceFileSystem {
     void Control(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize);
     const std::string& PathOf(Handle file) const;
 
-    DeviceFileSystem& below;
-    std::atomic<bool> interrupted{false};
+    DeviceFileSystem& below_;
+    std::atomic<bool> interrupted_{false};
     /// Guards what follows, and keeps files from being closed while their pipes are aborted.
-    CriticalSection section;
-    std::vector<OpenedFile> files;
-    std::vector<RunningTransfer> running;
+    CriticalSection section_;
+    std::vector<OpenedFile> files_;
+    std::vector<RunningTransfer> running_;
 };
 
 }  // namespace Varnholt::Platform

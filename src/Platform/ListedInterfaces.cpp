@@ -18,7 +18,7 @@ std::uint32_t DetailSizeOf(const std::string& path) {
 }  // namespace
 
 ListedInterfaces::ListedInterfaces(const Protocol::Guid& interfaceClass, std::vector<std::string> paths)
-    : listedClass(interfaceClass), listedPaths(std::move(paths)) {}
+    : listedClass_(interfaceClass), listedPaths_(std::move(paths)) {}
 
 bool ListedInterfaces::Find(const Protocol::Guid& interfaceClass, std::uint32_t index,
                             InterfaceRecord& record) const {
@@ -26,12 +26,12 @@ bool ListedInterfaces::Find(const Protocol::Guid& interfaceClass, std::uint32_t 
         SetLastError(Errors::InvalidParameter);
         return false;
     }
-    if (interfaceClass != listedClass || index >= listedPaths.size()) {
+    if (interfaceClass != listedClass_ || index >= listedPaths_.size()) {
         SetLastError(Errors::NoMoreItems);
         return false;
     }
     constexpr std::uint32_t InterfaceIsActive = 1;
-    record.interfaceClass = listedClass;
+    record.interfaceClass = listedClass_;
     record.flags = InterfaceIsActive;
     record.reserved = std::uintptr_t{index} + 1;  // 0 names nothing: a record that was never filled in
     return true;
@@ -64,12 +64,12 @@ bool ListedInterfaces::ReadDetail(const InterfaceRecord& record, std::span<std::
 }
 
 const std::string* ListedInterfaces::PathOf(const InterfaceRecord& record) const {
-    if (record.size != RecordSizeField || record.interfaceClass != listedClass || record.reserved == 0 ||
-        record.reserved > listedPaths.size()) {
+    if (record.size != RecordSizeField || record.interfaceClass != listedClass_ || record.reserved == 0 ||
+        record.reserved > listedPaths_.size()) {
         SetLastError(Errors::InvalidParameter);
         return nullptr;
     }
-    return &listedPaths[record.reserved - 1];
+    return &listedPaths_[record.reserved - 1];
 }
 
 }  // namespace Varnholt::Platform

@@ -26,8 +26,8 @@ class ListedInterfaces final {
     /// The path that a record of this list names; null, with the error code set, for any other record.
     const std::string* PathOf(const InterfaceRecord& record) const;
 
-    const Protocol::Guid listedClass;
-    const std::vector<std::string> listedPaths;
+    const Protocol::Guid listedClass_;
+    const std::vector<std::string> listedPaths_;
 };
 
 }  // namespace Varnholt::Platform

@@ -3,7 +3,7 @@
 namespace Varnholt::Platform {
 
 OverlappedRequest::OverlappedRequest(Handle completionEvent) {
-    record.event = completionEvent;
+    record_.event = completionEvent;
 }
 
 OverlappedRequest::~OverlappedRequest() {
@@ -12,29 +12,29 @@ OverlappedRequest::~OverlappedRequest() {
 
 bool OverlappedRequest::StartRead(Handle readFrom, void* buffer, std::uint32_t length) {
     CancelAndWait();
-    return Started(readFrom, DeviceFiles().StartRead(readFrom, buffer, length, record));
+    return Started(readFrom, DeviceFiles().StartRead(readFrom, buffer, length, record_));
 }
 
 bool OverlappedRequest::StartWrite(Handle writeTo, const void* buffer, std::uint32_t length) {
     CancelAndWait();
-    return Started(writeTo, DeviceFiles().StartWrite(writeTo, buffer, length, record));
+    return Started(writeTo, DeviceFiles().StartWrite(writeTo, buffer, length, record_));
 }
 
 bool OverlappedRequest::StartControl(Handle device, std::uint32_t code, const void* input,
                                      std::uint32_t inputSize, void* output, std::uint32_t outputSize) {
     CancelAndWait();
     return Started(device,
-                   DeviceFiles().StartControl(device, code, input, inputSize, output, outputSize, record));
+                   DeviceFiles().StartControl(device, code, input, inputSize, output, outputSize, record_));
 }
 
 bool OverlappedRequest::Started(Handle startedOn, bool completedAtOnce) {
-    file = startedOn;
+    file_ = startedOn;
     if (completedAtOnce) {
-        state = State::Running;  // its result is still to be fetched
+        state_ = State::Running;  // its result is still to be fetched
         return true;
     }
-    startError = LastError();
-    state = startError == Errors::IoPending ? State::Running : State::FailedToStart;
+    startError_ = LastError();
+    state_ = startError_ == Errors::IoPending ? State::Running : State::FailedToStart;
     return false;
 }
 
@@ -47,37 +47,37 @@ bool OverlappedRequest::AwaitResult(std::uint32_t& transferred) {
 }
 
 bool OverlappedRequest::FetchResult(std::uint32_t& transferred, bool wait) {
-    if (state == State::FailedToStart || state == State::Idle) {
+    if (state_ == State::FailedToStart || state_ == State::Idle) {
         transferred = 0;
-        SetLastError(state == State::Idle ? Errors::InvalidParameter : startError);
+        SetLastError(state_ == State::Idle ? Errors::InvalidParameter : startError_);
         return false;
     }
-    const bool succeeded = DeviceFiles().GetResult(file, record, transferred, wait);
+    const bool succeeded = DeviceFiles().GetResult(file_, record_, transferred, wait);
     if (succeeded) {
-        state = State::Completed;
+        state_ = State::Completed;
         return true;
     }
     const ErrorCode code = LastError();
     if (code == Errors::IoIncomplete) {
         transferred = 0;
     } else {
-        state = State::Completed;
+        state_ = State::Completed;
     }
     SetLastError(code);
     return false;
 }
 
 std::uint32_t OverlappedRequest::CancelAndWait() {
-    if (state != State::Running) {
+    if (state_ != State::Running) {
         return 0;
     }
     const ErrorCode before = LastError();
     std::uint32_t transferred = 0;
-    if (!DeviceFiles().GetResult(file, record, transferred, false) && LastError() == Errors::IoIncomplete) {
-        DeviceFiles().CancelTransfers(file);
-        DeviceFiles().GetResult(file, record, transferred, true);
+    if (!DeviceFiles().GetResult(file_, record_, transferred, false) && LastError() == Errors::IoIncomplete) {
+        DeviceFiles().CancelTransfers(file_);
+        DeviceFiles().GetResult(file_, record_, transferred, true);
     }
-    state = State::Completed;
+    state_ = State::Completed;
     SetLastError(before);
     return transferred;
 }

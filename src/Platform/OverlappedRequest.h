@@ -34,8 +34,8 @@ class OverlappedRequest final {
     /// `LastError` is left as it was.
     std::uint32_t CancelAndWait();
 
-    bool IsRunning() const { return state == State::Running; }
-    Handle CompletionEvent() const { return record.event; }
+    bool IsRunning() const { return state_ == State::Running; }
+    Handle CompletionEvent() const { return record_.event; }
 
   private:
     enum class State { Idle, Running, Completed, FailedToStart };
@@ -43,10 +43,10 @@ class OverlappedRequest final {
     bool Started(Handle startedOn, bool completedAtOnce);
     bool FetchResult(std::uint32_t& transferred, bool wait);
 
-    Overlapped record;
-    Handle file = NoHandle;
-    State state = State::Idle;
-    ErrorCode startError = Errors::Success;
+    Overlapped record_;
+    Handle file_ = NoHandle;
+    State state_ = State::Idle;
+    ErrorCode startError_ = Errors::Success;
 };
 
 }  // namespace Varnholt::Platform

@@ -61,13 +61,13 @@ class CriticalSection final {
 
     class Holder final {
       public:
-        explicit Holder(CriticalSection& held) : section(held) { section.Enter(); }
-        ~Holder() { section.Leave(); }
+        explicit Holder(CriticalSection& held) : section_(held) { section_.Enter(); }
+        ~Holder() { section_.Leave(); }
         Holder(const Holder&) = delete;
         Holder& operator=(const Holder&) = delete;
 
       private:
-        CriticalSection& section;
+        CriticalSection& section_;
     };
 
   private:
@@ -76,7 +76,7 @@ class CriticalSection final {
 
     /// Holds the platform's `Impl`.
     static constexpr std::size_t ImplSize = 80;
-    alignas(void*) std::byte storage[ImplSize];
+    alignas(void*) std::byte storage_[ImplSize];
 };
 
 }  // namespace Varnholt::Platform

@@ -80,11 +80,11 @@ std::uint32_t CUsbIo::OpenPath(const std::string& path) {
         return code == Platform::Errors::FileNotFound ? Status::DeviceNotFound : code;
     }
     FileHandle = file;
-    controlEvent = Platform::OwnedHandle(Platform::MakeAutoResetEvent());
-    if (!controlEvent) {
+    controlEvent_ = Platform::OwnedHandle(Platform::MakeAutoResetEvent());
+    if (!controlEvent_) {
         return Status::NoMemory;
     }
-    controlRequest.emplace(controlEvent.Get());
+    controlRequest_.emplace(controlEvent_.Get());
     return Status::Success;
 }
 
@@ -121,8 +121,8 @@ void CUsbIo::Close() {
     if (file != Platform::NoHandle) {
         DeviceFiles().CloseFile(file);
     }
-    controlRequest.reset();
-    controlEvent.Reset();
+    controlRequest_.reset();
+    controlEvent_.Reset();
     DetailData.clear();
 }
 
@@ -142,18 +142,18 @@ std::uint32_t CUsbIo::IoctlSync(std::uint32_t code, const void* input, std::uint
     std::uint32_t transferred = 0;
     std::uint32_t status = Status::Success;
     {
-        Platform::CriticalSection::Holder hold(controlLock);
-        if (!controlRequest->StartControl(FileHandle, code, input, inputSize, output, outputSize)) {
+        Platform::CriticalSection::Holder hold(controlLock_);
+        if (!controlRequest_->StartControl(FileHandle, code, input, inputSize, output, outputSize)) {
             status = FailureCode();
         }
         if (status == Platform::Errors::IoPending) {
             status = Status::Success;
         }
-        if (status == Status::Success && !controlRequest->AwaitResult(transferred)) {
+        if (status == Status::Success && !controlRequest_->AwaitResult(transferred)) {
             status = FailureCode();
         }
-        if (controlRequest->IsRunning()) {  // the wait was refused; the caller's buffers must be free again
-            transferred = controlRequest->CancelAndWait();
+        if (controlRequest_->IsRunning()) {  // the wait was refused; the caller's buffers must be free again
+            transferred = controlRequest_->CancelAndWait();
         }
     }
     if (bytesReturned) {

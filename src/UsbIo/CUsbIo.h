@@ -81,9 +81,9 @@ class CUsbIo {
                              const Protocol::Guid* interfaceGuid);
     std::uint32_t OpenPath(const std::string& path);
 
-    Platform::CriticalSection controlLock;  ///< guards `controlRequest` during a device control
-    Platform::OwnedHandle controlEvent;
-    std::optional<Platform::OverlappedRequest> controlRequest;  ///< set while open
+    Platform::CriticalSection controlLock_;  ///< guards `controlRequest` during a device control
+    Platform::OwnedHandle controlEvent_;
+    std::optional<Platform::OverlappedRequest> controlRequest_;  ///< set while open
     std::vector<std::byte> DetailData;  ///< interface detail record of the open device; empty without one
 };
 

@@ -9,7 +9,7 @@ namespace Varnholt::UsbIo {
 
 using namespace Platform;
 
-CUsbIoBuffer::CUsbIoBuffer() : completionEvent(MakeAutoResetEvent()), request(completionEvent.Get()) {}
+CUsbIoBuffer::CUsbIoBuffer() : completionEvent_(MakeAutoResetEvent()), request_(completionEvent_.Get()) {}
 
 CUsbIoBuffer::CUsbIoBuffer(void* data, std::uint32_t size) : CUsbIoBuffer() {
     Buffer = data;
@@ -17,8 +17,8 @@ CUsbIoBuffer::CUsbIoBuffer(void* data, std::uint32_t size) : CUsbIoBuffer() {
 }
 
 CUsbIoBuffer::CUsbIoBuffer(std::uint32_t size) : CUsbIoBuffer() {
-    allocatedMemory.reset(new (std::nothrow) std::uint8_t[size]);
-    Buffer = allocatedMemory.get();
+    allocatedMemory_.reset(new (std::nothrow) std::uint8_t[size]);
+    Buffer = allocatedMemory_.get();
     Size = Buffer ? size : 0;
 }
 
@@ -29,13 +29,13 @@ CUsbIoBuffer::~CUsbIoBuffer() {
 bool CUsbIoBuffer::Start(Handle file, Direction direction) {
     CancelAndCollect();
     BytesTransferred = 0;
-    if (!completionEvent || NumberOfBytesToTransfer > Size) {
-        Status = completionEvent ? Errors::InvalidParameter : Errors::NoSystemResources;
+    if (!completionEvent_ || NumberOfBytesToTransfer > Size) {
+        Status = completionEvent_ ? Errors::InvalidParameter : Errors::NoSystemResources;
         return false;
     }
     const bool completedAtOnce = direction == Direction::Read
-                                     ? request.StartRead(file, Buffer, NumberOfBytesToTransfer)
-                                     : request.StartWrite(file, Buffer, NumberOfBytesToTransfer);
+                                     ? request_.StartRead(file, Buffer, NumberOfBytesToTransfer)
+                                     : request_.StartWrite(file, Buffer, NumberOfBytesToTransfer);
     if (completedAtOnce) {
         Collect();
         return Status == Errors::Success || IsPending();
@@ -45,7 +45,7 @@ bool CUsbIoBuffer::Start(Handle file, Direction direction) {
 }
 
 void CUsbIoBuffer::Collect() {
-    Status = request.GetResult(BytesTransferred) ? Errors::Success : FailureCode();
+    Status = request_.GetResult(BytesTransferred) ? Errors::Success : FailureCode();
     if (Status == Errors::IoIncomplete) {
         Status = Errors::IoPending;
     }
@@ -53,8 +53,8 @@ void CUsbIoBuffer::Collect() {
 }
 
 void CUsbIoBuffer::CancelAndCollect() {
-    if (request.IsRunning()) {
-        BytesTransferred = request.CancelAndWait();
+    if (request_.IsRunning()) {
+        BytesTransferred = request_.CancelAndWait();
         Status = Errors::OperationAborted;
         LimitCount();
     }

@@ -51,9 +51,9 @@ class CUsbIoBuffer final {
     /// Whatever a driver reports, nobody is sent behind the end of the buffer.
     void LimitCount();
 
-    const Platform::OwnedHandle completionEvent;
-    Platform::OverlappedRequest request;
-    std::unique_ptr<std::uint8_t[]> allocatedMemory;
+    const Platform::OwnedHandle completionEvent_;
+    Platform::OverlappedRequest request_;
+    std::unique_ptr<std::uint8_t[]> allocatedMemory_;
 };
 
 }  // namespace Varnholt::UsbIo

@@ -14,50 +14,50 @@ CUsbIoBufferPool::~CUsbIoBufferPool() {
 }
 
 bool CUsbIoBufferPool::Allocate(std::uint32_t sizeOfBuffer, std::uint32_t numberOfBuffers) try {
-    Holder hold(lock);
+    Holder hold(lock_);
     const std::uint64_t total = std::uint64_t{sizeOfBuffer} * numberOfBuffers;
-    if (buffers || total > std::numeric_limits<std::ptrdiff_t>::max()) {
+    if (buffers_ || total > std::numeric_limits<std::ptrdiff_t>::max()) {
         return false;
     }
     auto newMemory = std::make_unique<std::uint8_t[]>(static_cast<std::size_t>(total));
-    buffers = std::make_unique<CUsbIoBuffer[]>(numberOfBuffers);
-    memory = std::move(newMemory);
+    buffers_ = std::make_unique<CUsbIoBuffer[]>(numberOfBuffers);
+    memory_ = std::move(newMemory);
     for (std::uint32_t i = 0; i < numberOfBuffers; ++i) {
-        buffers[i].Buffer = memory.get() + std::size_t{i} * sizeOfBuffer;
-        buffers[i].Size = sizeOfBuffer;
-        buffers[i].Next = Head;
-        Head = &buffers[i];
+        buffers_[i].Buffer = memory_.get() + std::size_t{i} * sizeOfBuffer;
+        buffers_[i].Size = sizeOfBuffer;
+        buffers_[i].Next = Head;
+        Head = &buffers_[i];
     }
-    currentCount = numberOfBuffers;
+    currentCount_ = numberOfBuffers;
     return true;
 } catch (const std::bad_alloc&) {
     return false;
 }
 
 void CUsbIoBufferPool::Free() {
-    Holder hold(lock);
-    buffers.reset();
-    memory.reset();
+    Holder hold(lock_);
+    buffers_.reset();
+    memory_.reset();
     Head = nullptr;
-    currentCount = 0;
+    currentCount_ = 0;
 }
 
 CUsbIoBuffer* CUsbIoBufferPool::Get() {
-    Holder hold(lock);
+    Holder hold(lock_);
     if (!Head) {
         return nullptr;
     }
-    --currentCount;
+    --currentCount_;
     CUsbIoBuffer* const buffer = Head;
     Head = std::exchange(buffer->Next, nullptr);
     return buffer;
 }
 
 void CUsbIoBufferPool::Put(CUsbIoBuffer* buffer) {
-    Holder hold(lock);
+    Holder hold(lock_);
     buffer->Next = Head;
     Head = buffer;
-    ++currentCount;
+    ++currentCount_;
 }
 
 }  // namespace Varnholt::UsbIo

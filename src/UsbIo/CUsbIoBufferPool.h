@@ -27,14 +27,14 @@ class CUsbIoBufferPool final {
     void Put(CUsbIoBuffer* buffer);
 
     /// Free buffers.
-    std::uint32_t CurrentCount() const { return currentCount; }
+    std::uint32_t CurrentCount() const { return currentCount_; }
 
   private:
-    Platform::CriticalSection lock;               ///< guards all below
-    CUsbIoBuffer* Head = nullptr;                 ///< first free buffer
-    std::atomic<std::uint32_t> currentCount = 0;  ///< also read without the lock
-    std::unique_ptr<std::uint8_t[]> memory;       ///< what the buffers' transfers write to: freed after them
-    std::unique_ptr<CUsbIoBuffer[]> buffers;
+    Platform::CriticalSection lock_;               ///< guards all below
+    CUsbIoBuffer* Head = nullptr;                  ///< first free buffer
+    std::atomic<std::uint32_t> currentCount_ = 0;  ///< also read without the lock
+    std::unique_ptr<std::uint8_t[]> memory_;       ///< what the buffers' transfers write to: freed after them
+    std::unique_ptr<CUsbIoBuffer[]> buffers_;
 };
 
 }  // namespace Varnholt::UsbIo

@@ -35,7 +35,7 @@ std::uint32_t CUsbIoPipe::WaitForCompletion(CUsbIoBuffer& buffer, std::uint32_t 
     if (!buffer.IsPending()) {
         return buffer.Status;
     }
-    const std::array objects{buffer.completionEvent.Get(), event};
+    const std::array objects{buffer.completionEvent_.Get(), event};
     const auto waited = Platform::WaitAny(
         std::span(objects).first(event == Platform::NoHandle ? 1 : objects.size()), timeout);
     switch (waited.result) {

@@ -8,7 +8,7 @@ void CUsbIoReader::ThreadRoutine() {
     if (BufferPool.CurrentCount() == 0) {
         return;
     }
-    errorCount = 0;
+    errorCount_ = 0;
     while (!MustEnd()) {
         while (HeldBuffer buffer = TakeFree()) {
             PrepareBuffer(*buffer);

@@ -36,26 +36,26 @@ void CUsbIoThread::OnBufferError(CUsbIoBuffer&) {}
 void CUsbIoThread::OnThreadExit() {}
 
 bool CUsbIoThread::StartThread(std::uint32_t maxErrorCount) {
-    CriticalSection::Holder hold(startLock);
-    if (threadHandle != NoHandle) {
+    CriticalSection::Holder hold(startLock_);
+    if (threadHandle_ != NoHandle) {
         return false;
     }
     TerminateFlag = false;
     MaxErrorCount = maxErrorCount;
-    stopEvent = Platform::OwnedHandle(Platform::MakeAutoResetEvent());
-    if (!stopEvent) {
+    stopEvent_ = Platform::OwnedHandle(Platform::MakeAutoResetEvent());
+    if (!stopEvent_) {
         return false;
     }
-    threadId = std::thread::id();
-    threadHandle = Platform::StartThread(&ThreadProcedure, this);
-    return threadHandle != NoHandle;
+    threadId_ = std::thread::id();
+    threadHandle_ = Platform::StartThread(&ThreadProcedure, this);
+    return threadHandle_ != NoHandle;
 }
 
 std::uint32_t CUsbIoThread::ThreadProcedure(void* self) {
     auto& thread = *static_cast<CUsbIoThread*>(self);
     // A thread that is done at once must find its handle stored, or the handle would stay behind.
-    { CriticalSection::Holder hold(thread.startLock); }
-    thread.threadId = std::this_thread::get_id();
+    { CriticalSection::Holder hold(thread.startLock_); }
+    thread.threadId_ = std::this_thread::get_id();
     Platform::SetCurrentThreadPriority(thread.ThreadPriority);
     try {
         thread.ThreadRoutine();
@@ -69,7 +69,7 @@ std::uint32_t CUsbIoThread::ThreadProcedure(void* self) {
     } catch (...) {
         // There is nothing left to end.
     }
-    const Platform::Handle handle = thread.threadHandle.exchange(NoHandle);
+    const Platform::Handle handle = thread.threadHandle_.exchange(NoHandle);
     if (handle != NoHandle) {
         Platform::Close(handle);
     }
@@ -77,15 +77,15 @@ std::uint32_t CUsbIoThread::ThreadProcedure(void* self) {
 }
 
 bool CUsbIoThread::ShutdownThread() {
-    const bool onThreadItself = threadHandle != NoHandle && threadId.load() == std::this_thread::get_id();
-    const Platform::Handle handle = onThreadItself ? NoHandle : threadHandle.exchange(NoHandle);
+    const bool onThreadItself = threadHandle_ != NoHandle && threadId_.load() == std::this_thread::get_id();
+    const Platform::Handle handle = onThreadItself ? NoHandle : threadHandle_.exchange(NoHandle);
     if (handle == NoHandle && !onThreadItself) {
         return true;
     }
     TerminateFlag = true;
     StopTransfers();
     // A transfer that the thread started after `StopTransfers` would be waited for without limit.
-    Platform::SignalEvent(stopEvent.Get());
+    Platform::SignalEvent(stopEvent_.Get());
     if (onThreadItself) {
         return false;
     }
@@ -95,42 +95,42 @@ bool CUsbIoThread::ShutdownThread() {
 }
 
 bool CUsbIoThread::MustEnd() const {
-    return TerminateFlag || errorCount > MaxErrorCount;
+    return TerminateFlag || errorCount_ > MaxErrorCount;
 }
 
 void CUsbIoThread::AppendPending(HeldBuffer buffer) {
     CUsbIoBuffer* const pending = buffer.release();
     pending->Next = nullptr;
-    (lastPending ? lastPending->Next : firstPending) = pending;
-    lastPending = pending;
+    (lastPending_ ? lastPending_->Next : firstPending_) = pending;
+    lastPending_ = pending;
 }
 
 CUsbIoThread::HeldBuffer CUsbIoThread::RemoveFirstPending() {
-    CUsbIoBuffer* const buffer = firstPending;
-    firstPending = std::exchange(buffer->Next, nullptr);
-    if (!firstPending) {
-        lastPending = nullptr;
+    CUsbIoBuffer* const buffer = firstPending_;
+    firstPending_ = std::exchange(buffer->Next, nullptr);
+    if (!firstPending_) {
+        lastPending_ = nullptr;
     }
     return Hold(buffer);
 }
 
 void CUsbIoThread::WaitForFirstPending() {
-    const std::uint32_t status = WaitForCompletion(*firstPending, Platform::Infinite, stopEvent.Get());
+    const std::uint32_t status = WaitForCompletion(*firstPending_, Platform::Infinite, stopEvent_.Get());
     if (status == Status::UserEvent) {
         CancelIo();
-        WaitForCompletion(*firstPending, Platform::Infinite);
+        WaitForCompletion(*firstPending_, Platform::Infinite);
     }
-    CancelToCompletion(*firstPending);  // where a wait was refused
+    CancelToCompletion(*firstPending_);  // where a wait was refused
 }
 
 CUsbIoThread::HeldBuffer CUsbIoThread::TakeCompleted() {
     WaitForFirstPending();
-    CUsbIoBuffer& buffer = *firstPending;
+    CUsbIoBuffer& buffer = *firstPending_;
     if (buffer.Status == Status::Success) {
-        errorCount = 0;
+        errorCount_ = 0;
     } else {
         if (buffer.Status != Status::DevicePoweredDown) {
-            ++errorCount;
+            ++errorCount_;
         }
         OnBufferError(buffer);
     }

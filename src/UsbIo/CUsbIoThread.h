@@ -61,7 +61,7 @@ class CUsbIoThread : public CUsbIoPipe {
     /// Null when none is free.
     HeldBuffer TakeFree() { return Hold(BufferPool.Get()); }
     void AppendPending(HeldBuffer buffer);
-    bool HasPending() const { return firstPending != nullptr; }
+    bool HasPending() const { return firstPending_ != nullptr; }
     /// Waits without limit (on Linux a write ends after 5 s and 10 ms a byte) for the first pending buffer,
     /// takes it off the list and counts and reports an error. The transfers of this thread are cancelled when
     /// `ShutdownThread` asks for the end meanwhile.
@@ -72,7 +72,7 @@ class CUsbIoThread : public CUsbIoPipe {
     CUsbIoBufferPool BufferPool;
     std::atomic<bool> TerminateFlag = false;
     std::uint32_t MaxErrorCount = 3;
-    std::uint32_t errorCount = 0;  ///< failed transfers since the last good one
+    std::uint32_t errorCount_ = 0;  ///< failed transfers since the last good one
 
   private:
     static std::uint32_t ThreadProcedure(void* self);
@@ -80,13 +80,13 @@ class CUsbIoThread : public CUsbIoPipe {
     void WaitForFirstPending();
     HeldBuffer RemoveFirstPending();
 
-    std::atomic<Platform::Handle> threadHandle = Platform::NoHandle;  ///< null while no thread runs
-    std::atomic<std::thread::id> threadId;                            ///< of the running thread
-    Platform::CriticalSection startLock;  ///< held until the new thread's handle is stored
-    Platform::OwnedHandle stopEvent;      ///< wakes the thread from the wait for a transfer
+    std::atomic<Platform::Handle> threadHandle_ = Platform::NoHandle;  ///< null while no thread runs
+    std::atomic<std::thread::id> threadId_;                            ///< of the running thread
+    Platform::CriticalSection startLock_;  ///< held until the new thread's handle is stored
+    Platform::OwnedHandle stopEvent_;      ///< wakes the thread from the wait for a transfer
     // The list of the running transfers, in the order of their start; the thread's own.
-    CUsbIoBuffer* firstPending = nullptr;
-    CUsbIoBuffer* lastPending = nullptr;
+    CUsbIoBuffer* firstPending_ = nullptr;
+    CUsbIoBuffer* lastPending_ = nullptr;
 };
 
 }  // namespace Varnholt::UsbIo

@@ -8,7 +8,7 @@ void CUsbIoWriter::ThreadRoutine() {
     if (BufferPool.CurrentCount() == 0) {
         return;
     }
-    errorCount = 0;
+    errorCount_ = 0;
     bool finished = false;
     while (!finished && !MustEnd()) {
         while (HeldBuffer buffer = TakeFree()) {

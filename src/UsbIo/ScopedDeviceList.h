@@ -8,20 +8,20 @@ namespace Varnholt::UsbIo {
 class ScopedDeviceList final {
   public:
     explicit ScopedDeviceList(const Protocol::Guid& interfaceGuid)
-        : list(CUsbIo::CreateDeviceList(&interfaceGuid)) {}
+        : list_(CUsbIo::CreateDeviceList(&interfaceGuid)) {}
     ~ScopedDeviceList() {
-        if (list) {
-            CUsbIo::DestroyDeviceList(list);
+        if (list_) {
+            CUsbIo::DestroyDeviceList(list_);
         }
     }
     ScopedDeviceList(const ScopedDeviceList&) = delete;
     ScopedDeviceList& operator=(const ScopedDeviceList&) = delete;
 
     /// Null when the platform could not make the list.
-    Platform::DeviceList Get() const { return list; }
+    Platform::DeviceList Get() const { return list_; }
 
   private:
-    const Platform::DeviceList list;
+    const Platform::DeviceList list_;
 };
 
 }  // namespace Varnholt::UsbIo

@@ -26,41 +26,41 @@ class OneDriverEach final : public Platform::DeviceFileSystem {
 
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override {
         const bool isUsbIo = interfaceClass == UsbIoDriver::InterfaceClass;
-        return isUsbIo == (drivers == Transport::UsbIo) ? files.ListInterfaces(interfaceClass)
+        return isUsbIo == (drivers == Transport::UsbIo) ? files_.ListInterfaces(interfaceClass)
                                                         : std::vector<std::string>();
     }
-    Handle Open(const std::string& path) override { return files.Open(path); }
-    bool CloseFile(Handle file) override { return files.CloseFile(file); }
+    Handle Open(const std::string& path) override { return files_.Open(path); }
+    bool CloseFile(Handle file) override { return files_.CloseFile(file); }
     bool StartRead(Handle file, void* buffer, std::uint32_t length, Platform::Overlapped& record) override {
-        return files.StartRead(file, buffer, length, record);
+        return files_.StartRead(file, buffer, length, record);
     }
     bool StartWrite(Handle file, const void* buffer, std::uint32_t length,
                     Platform::Overlapped& record) override {
-        return files.StartWrite(file, buffer, length, record);
+        return files_.StartWrite(file, buffer, length, record);
     }
     bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
                       void* output, std::uint32_t outputSize, Platform::Overlapped& record) override {
         if (code == UsbIoDriver::Control::GetDriverInfo) {
-            driverInfo = static_cast<std::uint8_t*>(output);
-            informed = &record;
+            driverInfo_ = static_cast<std::uint8_t*>(output);
+            informed_ = &record;
         }
-        return files.StartControl(file, code, input, inputSize, output, outputSize, record);
+        return files_.StartControl(file, code, input, inputSize, output, outputSize, record);
     }
     bool GetResult(Handle file, Platform::Overlapped& record, std::uint32_t& transferred,
                    bool wait) override {
-        const bool succeeded = files.GetResult(file, record, transferred, wait);
-        if (succeeded && &record == informed) {
-            Protocol::StoreLittle16(driverInfo, interfaceVersion);
-            informed = nullptr;
+        const bool succeeded = files_.GetResult(file, record, transferred, wait);
+        if (succeeded && &record == informed_) {
+            Protocol::StoreLittle16(driverInfo_, interfaceVersion);
+            informed_ = nullptr;
         }
         return succeeded;
     }
-    bool CancelTransfers(Handle file) override { return files.CancelTransfers(file); }
+    bool CancelTransfers(Handle file) override { return files_.CancelTransfers(file); }
 
   private:
-    Platform::DeviceFileSystem& files = Platform::DeviceFiles();
-    std::uint8_t* driverInfo = nullptr;
-    const Platform::Overlapped* informed = nullptr;
+    Platform::DeviceFileSystem& files_ = Platform::DeviceFiles();
+    std::uint8_t* driverInfo_ = nullptr;
+    const Platform::Overlapped* informed_ = nullptr;
 };
 
 /// One of the two transports, a machine, and what the last finding says of it.

@@ -19,62 +19,62 @@ OSTRA_ON_BOTH_TRANSPORTS(InstrumentCommandsTest);
 
 TEST_P(InstrumentCommandsTest, List) {
     Fail({"list"}, ExitCode::NoInstrument, "no instrument is connected");
-    EXPECT_EQ(tool.Out(), "");
+    EXPECT_EQ(tool_.Out(), "");
     Fail({"list", "--json"}, ExitCode::NoInstrument);
-    EXPECT_EQ(tool.Json()["instruments"].size(), 0u);
+    EXPECT_EQ(tool_.Json()["instruments"].size(), 0u);
 
-    host.Add("sim-b");
-    host.Add("sim-a");
+    host_.Add("sim-b");
+    host_.Add("sim-a");
     Succeed({"list"});
-    EXPECT_EQ(tool.Out(),
+    EXPECT_EQ(tool_.Out(),
               "NAME   IDENTIFIER\nsim-a  " + Identifier("sim-a") + "\nsim-b  " + Identifier("sim-b") + "\n");
-    EXPECT_EQ(tool.Err(), "");
+    EXPECT_EQ(tool_.Err(), "");
     Succeed({"list", "--json"});
-    EXPECT_EQ(tool.Out(), std::string("{\"transport\":\"") + Name(GetParam()) +
-                              "\",\"instruments\":[{\"identifier\":\"" + Identifier("sim-a") +
-                              "\",\"name\":\"sim-a\"},{\"identifier\":\"" + Identifier("sim-b") +
-                              "\",\"name\":\"sim-b\"}]}\n");
+    EXPECT_EQ(tool_.Out(), std::string("{\"transport\":\"") + Name(GetParam()) +
+                               "\",\"instruments\":[{\"identifier\":\"" + Identifier("sim-a") +
+                               "\",\"name\":\"sim-a\"},{\"identifier\":\"" + Identifier("sim-b") +
+                               "\",\"name\":\"sim-b\"}]}\n");
 }
 
 TEST_P(InstrumentCommandsTest, TheTransportCanBeChosenAndIsGivenBack) {
-    host.Add("sim");
+    host_.Add("sim");
     const Transport other = GetParam() == Transport::Native ? Transport::UsbIo : Transport::Native;
     Succeed({"identify", "--transport", Name(other), "--json"});
-    EXPECT_EQ(tool.Json()["identifier"], std::string(Name(other)) + "/sim");
+    EXPECT_EQ(tool_.Json()["identifier"], std::string(Name(other)) + "/sim");
     Succeed({"identify", "--json"});
-    EXPECT_EQ(tool.Json()["identifier"], Identifier());
+    EXPECT_EQ(tool_.Json()["identifier"], Identifier());
 }
 
 /// All forms of one readout hold the same values.
 TEST_P(InstrumentCommandsTest, ReadoutForms) {
-    auto& instrument = host.Add("sim", Leisurely());
-    Succeed({"readout", "--raw", "--output", folder.Path("raw")});
+    auto& instrument = host_.Add("sim", Leisurely());
+    Succeed({"readout", "--raw", "--output", folder_.Path("raw")});
     EXPECT_EQ(ParametersOf(instrument), (Simulator::MeasureParameters{294, 0, 1, 6}));
     EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 1u);
-    const auto bytes = ReadFile(folder.Path("raw"));
+    const auto bytes = ReadFile(folder_.Path("raw"));
     ASSERT_EQ(bytes.size(), 256u);
-    host.Add("sim");  // the same noise once more for each
+    host_.Add("sim");  // the same noise once more for each
     Succeed({"readout", "--json"});
-    const std::vector<int> values = tool.Json()["values"];
+    const std::vector<int> values = tool_.Json()["values"];
     const auto expected = Interface::ReadoutFromBytes(std::span<const std::uint8_t, 256>(bytes.data(), 256));
     EXPECT_TRUE(std::equal(values.begin(), values.end(), expected.begin()));
 
-    host.Add("sim");
+    host_.Add("sim");
     Succeed({"readout", "--csv"});
     std::string csv = "1,0.000";
     for (const int value : values) {
         csv += "," + std::to_string(value);
     }
-    ASSERT_EQ(tool.Lines().size(), 2u);
-    EXPECT_TRUE(tool.Lines()[0].starts_with("readout,seconds,0,1,2,"));
-    EXPECT_TRUE(tool.Lines()[0].ends_with(",127,time,p1,p2,p3,p4,integrationTime"));
-    EXPECT_TRUE(tool.Lines()[1].starts_with(csv + ",20"));
-    EXPECT_TRUE(tool.Lines()[1].ends_with(",294,0,1,6,0.019992"));
+    ASSERT_EQ(tool_.Lines().size(), 2u);
+    EXPECT_TRUE(tool_.Lines()[0].starts_with("readout,seconds,0,1,2,"));
+    EXPECT_TRUE(tool_.Lines()[0].ends_with(",127,time,p1,p2,p3,p4,integrationTime"));
+    EXPECT_TRUE(tool_.Lines()[1].starts_with(csv + ",20"));
+    EXPECT_TRUE(tool_.Lines()[1].ends_with(",294,0,1,6,0.019992"));
 
-    host.Add("sim");
+    host_.Add("sim");
     Succeed({"readout"});
-    ASSERT_EQ(tool.Lines().size(), 17u);
-    std::istringstream printed(tool.Out());
+    ASSERT_EQ(tool_.Lines().size(), 17u);
+    std::istringstream printed(tool_.Out());
     for (std::size_t i = 0; i < values.size(); ++i) {
         if (std::string index; i % 8 == 0) {
             printed >> index;
@@ -104,12 +104,12 @@ TEST_P(InstrumentCommandsTest, ReadoutsSayWhatTheyWereTakenWith) {
              Case{300, {}, {294, 0, 1, 6}, 294 * 68e-6},
          }) {
         settings.firmware = row.firmware;
-        host.Add("sim", settings);
+        host_.Add("sim", settings);
         Arguments arguments = row.options;
         arguments.insert(arguments.begin(), {"readout", "--json", "--repeat", "2", "--interval", "60"});
         Succeed(arguments);
-        ASSERT_EQ(tool.Lines().size(), 2u);
-        for (const std::string& line : tool.Lines()) {
+        ASSERT_EQ(tool_.Lines().size(), 2u);
+        for (const std::string& line : tool_.Lines()) {
             const auto readout = nlohmann::json::parse(line);
             EXPECT_EQ(readout["parameters"], row.parameters);
             EXPECT_NEAR(readout["integrationTime"], row.time, 1e-9);
@@ -117,7 +117,7 @@ TEST_P(InstrumentCommandsTest, ReadoutsSayWhatTheyWereTakenWith) {
                         testing::MatchesRegex("20..-..-..T..:..:..\\.......:.."));
         }
         const auto minute = [this](std::size_t line) {
-            const std::string time = nlohmann::json::parse(tool.Lines()[line])["time"];
+            const std::string time = nlohmann::json::parse(tool_.Lines()[line])["time"];
             return std::stoi(time.substr(14, 2));
         };
         EXPECT_EQ((minute(0) + 1) % 60, minute(1));
@@ -125,37 +125,37 @@ TEST_P(InstrumentCommandsTest, ReadoutsSayWhatTheyWereTakenWith) {
 }
 
 TEST_P(InstrumentCommandsTest, ReadoutPlotsInTheCharactersOfTheTerminal) {
-    host.Add("sim");
+    host_.Add("sim");
     Succeed({"readout", "--plot"});
-    EXPECT_THAT(tool.Out(), HasSubstr("*"));
-    EXPECT_EQ(tool.Out().find("\xE2\xA0"), std::string::npos);
-    tool.outFacts.showsUtf8 = true;
+    EXPECT_THAT(tool_.Out(), HasSubstr("*"));
+    EXPECT_EQ(tool_.Out().find("\xE2\xA0"), std::string::npos);
+    tool_.outFacts.showsUtf8 = true;
     Succeed({"readout", "--plot"});
-    EXPECT_EQ(tool.Out().find('*'), std::string::npos);
-    EXPECT_THAT(tool.Out(), HasSubstr("\xE2\xA0"));
+    EXPECT_EQ(tool_.Out().find('*'), std::string::npos);
+    EXPECT_THAT(tool_.Out(), HasSubstr("\xE2\xA0"));
     Succeed({"readout", "--plot", "--ascii"});
-    EXPECT_EQ(tool.Out().find("\xE2\xA0"), std::string::npos);
+    EXPECT_EQ(tool_.Out().find("\xE2\xA0"), std::string::npos);
 }
 
 TEST_P(InstrumentCommandsTest, ReadoutRepeatsFromStartToStart) {
-    host.Add("sim", Leisurely());
+    host_.Add("sim", Leisurely());
     struct Case {
         const char* repeat;
         const char* interval;
     };
     std::vector<Case> cases{{"3", "2"}};
-    if (clock.IsVirtual()) {
+    if (clock_.IsVirtual()) {
         cases.push_back({"52", "86400"});  // longer than 32 bits count milliseconds
     }
     for (const Case& row : cases) {
         Succeed({"readout", "--json", "--repeat", row.repeat, "--interval", row.interval});
-        const auto lines = tool.Lines();
+        const auto lines = tool_.Lines();
         ASSERT_EQ(lines.size(), std::stoul(row.repeat));
         for (std::size_t i = 0; i < lines.size(); ++i) {
             const auto line = nlohmann::json::parse(lines[i]);
             EXPECT_EQ(line["readout"], i + 1);
             EXPECT_NEAR(line["seconds"], std::stod(row.interval) * static_cast<double>(i),
-                        clock.IsVirtual() ? 0.01 : 0.5);
+                        clock_.IsVirtual() ? 0.01 : 0.5);
         }
     }
 }
@@ -182,43 +182,43 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
                  Case{"5", "bulk-in 0:stall", never, ExitCode::InputOutput, "; nothing was recorded", 0},
              }) {
             SCOPED_TRACE(row.text);
-            host.Add("sim", Leisurely());
+            host_.Add("sim", Leisurely());
             SetFaults(row.faults);
             if (existed) {
-                WriteFile(folder.Path("csv"), {1});
+                WriteFile(folder_.Path("csv"), {1});
             }
             Cli::Interruption interruption;
-            tool.interruption = &interruption;
+            tool_.interruption = &interruption;
             const auto event = After(row.interruptedAt, [&] { interruption.Request(); });
             Fail({"readout", "--csv", "--repeat", row.repeat, "--interval", "1", "--output",
-                  folder.Path("csv")},
+                  folder_.Path("csv")},
                  row.code, row.text);
             Platform::ClockScheduler().Forget(event);
             const bool isComplete = row.code == ExitCode::Success && row.lines > 0;
-            const std::string kept = folder.Path(existed && !isComplete ? "csv.part" : "csv");
+            const std::string kept = folder_.Path(existed && !isComplete ? "csv.part" : "csv");
             const auto content = row.lines > 0 ? ReadFile(kept) : std::vector<std::uint8_t>();
             EXPECT_EQ(std::count(content.begin(), content.end(), '\n'), row.lines);
             EXPECT_EQ(std::filesystem::remove(kept), row.lines > 0);
-            EXPECT_EQ(folder.Files().size(), existed && !isComplete ? 1u : 0u);
+            EXPECT_EQ(folder_.Files().size(), existed && !isComplete ? 1u : 0u);
             EXPECT_TRUE(!existed || isComplete ||
-                        ReadFile(folder.Path("csv")) == std::vector<std::uint8_t>{1});
+                        ReadFile(folder_.Path("csv")) == std::vector<std::uint8_t>{1});
         }
     }
 }
 
 TEST_P(InstrumentCommandsTest, ALivePlotFitsOnItsTerminalAndIsDrawnOver) {
-    host.Add("sim", Leisurely());
-    tool.outFacts.isTerminal = true;
+    host_.Add("sim", Leisurely());
+    tool_.outFacts.isTerminal = true;
     Succeed({"readout", "--plot", "--repeat", "3"});
-    EXPECT_EQ(tool.Out().find('\x1b'), std::string::npos) << "a terminal that cannot be drawn on";
-    tool.outFacts.movesCursor = true;
+    EXPECT_EQ(tool_.Out().find('\x1b'), std::string::npos) << "a terminal that cannot be drawn on";
+    tool_.outFacts.movesCursor = true;
     for (const Cli::TerminalSize size :
          {Cli::TerminalSize{20, 24}, Cli::TerminalSize{40, 10}, Cli::TerminalSize{132, 50}}) {
-        tool.outFacts.size = [size] { return size; };
+        tool_.outFacts.size = [size] { return size; };
         Succeed({"readout", "--plot", "--repeat", "3"});
         int lines = 0;
         int drawnOver = 0;
-        for (const std::string& line : tool.Lines()) {
+        for (const std::string& line : tool_.Lines()) {
             if (line.starts_with("\r\x1b[")) {
                 EXPECT_TRUE(line.starts_with("\r\x1b[" + std::to_string(lines) + "A\x1b[J"));
                 ++drawnOver;
@@ -233,11 +233,11 @@ TEST_P(InstrumentCommandsTest, ALivePlotFitsOnItsTerminalAndIsDrawnOver) {
 }
 
 TEST_P(InstrumentCommandsTest, OutputThatCannotBeWrittenEndsACommandAtOnce) {
-    auto& instrument = host.Add("sim");
-    tool.CloseOut();
+    auto& instrument = host_.Add("sim");
+    tool_.CloseOut();
     for (const Arguments& command : std::vector<Arguments>{
              {"readout", "--csv", "--repeat", "60", "--interval", "1"}, {"monitor", "--for", "60"}}) {
-        const Stopwatch watch(clock);
+        const Stopwatch watch(clock_);
         const auto event = After(500'000, [&] { instrument.PressButton(); });
         Fail(command, ExitCode::File, "the output cannot be written");
         watch.ExpectAtMost(5000);
@@ -246,7 +246,7 @@ TEST_P(InstrumentCommandsTest, OutputThatCannotBeWrittenEndsACommandAtOnce) {
 }
 
 TEST_P(InstrumentCommandsTest, ReadoutWithAnIntegrationTimeChoosesTheMode) {
-    auto& instrument = host.Add("sim");
+    auto& instrument = host_.Add("sim");
     Succeed({"readout", "--integration-time", "0.5"});
     EXPECT_EQ(ModeOf(instrument), 1);
     EXPECT_EQ(ParametersOf(instrument), (Simulator::MeasureParameters{7353, 0, 1, 6}));  // of 68 us
@@ -254,16 +254,16 @@ TEST_P(InstrumentCommandsTest, ReadoutWithAnIntegrationTimeChoosesTheMode) {
     EXPECT_EQ(ModeOf(instrument), 2);
     EXPECT_EQ(ParametersOf(instrument).p1, 147);  // of 34 us
     Fail({"readout", "--integration-time", "60"}, ExitCode::BadData, "Integration time too high");
-    EXPECT_THAT(tool.Err(), HasSubstr("mode 2: 0.00442 s to 2.22819 s"));
+    EXPECT_THAT(tool_.Err(), HasSubstr("mode 2: 0.00442 s to 2.22819 s"));
     EXPECT_EQ(ModeOf(instrument), 2);
 }
 
 TEST_P(InstrumentCommandsTest, Identify) {
     InstrumentSettings settings;
     settings.firmware = 305;
-    host.Add("sim", settings);
+    host_.Add("sim", settings);
     Succeed({"identify", "--json"});
-    const auto found = tool.Json();
+    const auto found = tool_.Json();
     EXPECT_EQ(found["identifier"], Identifier());
     EXPECT_EQ(found["name"], "sim");
     EXPECT_EQ(found["chipId"], "5a0123456789abcd");
@@ -271,11 +271,11 @@ TEST_P(InstrumentCommandsTest, Identify) {
     EXPECT_EQ(found["mode"][0], 3);
     EXPECT_EQ(found["parameters"][4], 0x55);
     Succeed({"identify"});
-    EXPECT_THAT(tool.Out(), HasSubstr("5a0123456789abcd"));
+    EXPECT_THAT(tool_.Out(), HasSubstr("5a0123456789abcd"));
 }
 
 TEST_P(InstrumentCommandsTest, ResetSendsItsCodeAfterTheOneOfTheOpening) {
-    auto& instrument = host.Add("sim");
+    auto& instrument = host_.Add("sim");
     Succeed({"reset", "--code", "017"});
     instrument.WithCommands([](const Simulator::Commands& commands) {
         EXPECT_EQ(commands.lastResetCode, 17) << "a leading zero means nothing";
@@ -285,57 +285,57 @@ TEST_P(InstrumentCommandsTest, ResetSendsItsCodeAfterTheOneOfTheOpening) {
 }
 
 TEST_P(InstrumentCommandsTest, MonitorReportsButtonAndRemoval) {
-    auto& instrument = host.Add("sim");
+    auto& instrument = host_.Add("sim");
     After(1'000'000, [&] { instrument.PressButton(); });
-    After(2'000'000, [&] { host.Bus().Unplug("sim"); });
+    After(2'000'000, [&] { host_.Bus().Unplug("sim"); });
     Succeed({"monitor", "--json"});
-    ASSERT_EQ(tool.Lines().size(), 2u) << tool.Out();
-    const auto button = nlohmann::json::parse(tool.Lines()[0]);
+    ASSERT_EQ(tool_.Lines().size(), 2u) << tool_.Out();
+    const auto button = nlohmann::json::parse(tool_.Lines()[0]);
     EXPECT_EQ(button["event"], "button");
-    EXPECT_NEAR(button["seconds"], 1.0, clock.IsVirtual() ? 0.05 : 0.5);
-    EXPECT_EQ(nlohmann::json::parse(tool.Lines()[1])["event"], "removed");
+    EXPECT_NEAR(button["seconds"], 1.0, clock_.IsVirtual() ? 0.05 : 0.5);
+    EXPECT_EQ(nlohmann::json::parse(tool_.Lines()[1])["event"], "removed");
 }
 
 TEST_P(InstrumentCommandsTest, MonitorEndsInTimeAndWithCtrlC) {
-    host.Add("sim");
-    const Stopwatch watch(clock);
+    host_.Add("sim");
+    const Stopwatch watch(clock_);
     Succeed({"monitor", "--for", "3"});
     watch.ExpectBetween(3000, 3100);
-    EXPECT_EQ(tool.Out(), "");
+    EXPECT_EQ(tool_.Out(), "");
     Cli::Interruption interruption;
-    tool.interruption = &interruption;
+    tool_.interruption = &interruption;
     After(1'000'000, [&] { interruption.Request(); });
     Succeed({"monitor"});
-    EXPECT_EQ(tool.Out(), "") << "an end that the user wants is no removal";
+    EXPECT_EQ(tool_.Out(), "") << "an end that the user wants is no removal";
 }
 
 TEST_P(InstrumentCommandsTest, WriteImageWritesTheBytesAsTheyAre) {
-    auto& instrument = host.Add("sim");
+    auto& instrument = host_.Add("sim");
     std::vector<std::uint8_t> image(8192);
     for (std::size_t i = 0; i < image.size(); ++i) {
         image[i] = static_cast<std::uint8_t>(i * 7 + i / 256);
     }
-    WriteFile(folder.Path("image"), image);
-    Succeed({"write-image", folder.Path("image")});
+    WriteFile(folder_.Path("image"), image);
+    Succeed({"write-image", folder_.Path("image")});
     EXPECT_EQ(instrument.Eeprom(), image);
     for (const std::size_t size : {0u, 8191u, 8193u}) {
-        WriteFile(folder.Path("wrong"), std::vector<std::uint8_t>(size));
-        Fail({"write-image", folder.Path("wrong")}, ExitCode::BadData, "is not an EEPROM image");
+        WriteFile(folder_.Path("wrong"), std::vector<std::uint8_t>(size));
+        Fail({"write-image", folder_.Path("wrong")}, ExitCode::BadData, "is not an EEPROM image");
     }
-    Fail({"write-image", folder.Path("missing")}, ExitCode::File);
+    Fail({"write-image", folder_.Path("missing")}, ExitCode::File);
     EXPECT_EQ(instrument.Eeprom(), image);
 }
 
 TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
-    host.Add("left");
-    host.Add("right");
+    host_.Add("left");
+    host_.Add("right");
     Fail({"identify", "--device", "up"}, ExitCode::NoInstrument, Identifier("right"));
     Succeed({"identify", "--device", "ight", "--json"});
-    EXPECT_EQ(tool.Json()["name"], "right");
-    EXPECT_EQ(tool.Err(), "");
+    EXPECT_EQ(tool_.Json()["name"], "right");
+    EXPECT_EQ(tool_.Err(), "");
     Succeed({"identify", "--json"});
-    EXPECT_EQ(tool.Json()["name"], "left");
-    EXPECT_THAT(tool.Err(), HasSubstr("taking " + Identifier("left")));
+    EXPECT_EQ(tool_.Json()["name"], "left");
+    EXPECT_THAT(tool_.Err(), HasSubstr("taking " + Identifier("left")));
     for (const Arguments& arguments : std::vector<Arguments>{
              {"-d", "right", "identify", "--json"},
              {"--device=right", "--transport", Name(GetParam()), "identify", "--json"},
@@ -343,7 +343,7 @@ TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
              {"ram", "-d", "right", "show", "--json"},
          }) {
         Succeed(arguments);
-        EXPECT_EQ(tool.Json()["identifier"], Identifier("right"));
+        EXPECT_EQ(tool_.Json()["identifier"], Identifier("right"));
     }
     const std::pair<Arguments, const char*> refused[] = {
         {{"-d", "left", "identify", "-d", "right"}, "--device is given twice: left and right"},
@@ -360,37 +360,37 @@ TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
 TEST_P(InstrumentCommandsTest, ChipsTellInstrumentsApart) {
     InstrumentSettings settings;
     settings.chipId = {1, 2, 3, 4, 5, 6, 7, 8};
-    auto& left = host.Add("left");
-    host.Add("right", settings);
+    auto& left = host_.Add("left");
+    host_.Add("right", settings);
     Succeed({"list", "--chip-id"});
-    EXPECT_THAT(tool.Lines()[2], testing::AllOf(HasSubstr("right"), HasSubstr("0102030405060708")));
+    EXPECT_THAT(tool_.Lines()[2], testing::AllOf(HasSubstr("right"), HasSubstr("0102030405060708")));
     Succeed({"identify", "--device", "chip:5A0123456789ABCD", "--json"});
-    EXPECT_EQ(tool.Json()["name"], "left");
+    EXPECT_EQ(tool_.Json()["name"], "left");
 
     ASSERT_EQ(left.Claim(), Platform::Errors::Success);
     Succeed({"list", "--chip-id", "--json"});
-    const auto instruments = tool.Json()["instruments"];
+    const auto instruments = tool_.Json()["instruments"];
     EXPECT_EQ(instruments[0]["chipId"], nullptr);
     EXPECT_THAT(instruments[0]["problem"].get<std::string>(), HasSubstr("used by another process"));
     EXPECT_EQ(instruments[1]["chipId"], "0102030405060708");
     Succeed({"identify", "-d", "chip:0102030405060708", "--json"});
-    EXPECT_EQ(tool.Json()["name"], "right");
+    EXPECT_EQ(tool_.Json()["name"], "right");
     Fail({"identify", "-d", "chip:5a0123456789abcd"}, ExitCode::NotAvailable,
          Identifier("left") + ": the instrument is used");
     left.Release();
 
     Fail({"identify", "-d", "chip:5a0123456789abce"}, ExitCode::NoInstrument, "chip:5a0123456789abce");
     Fail({"identify", "-d", "chip:5a"}, ExitCode::Usage, "16 hexadecimal digits");
-    host.Bus().SetFaults("left", Simulator::FaultPlan::Parse("control 0+:stall"));
+    host_.Bus().SetFaults("left", Simulator::FaultPlan::Parse("control 0+:stall"));
     Fail({"list", "--chip-id", "--json"}, ExitCode::InputOutput, Identifier("left"));
-    EXPECT_EQ(tool.Json()["instruments"].size(), 2u);
+    EXPECT_EQ(tool_.Json()["instruments"].size(), 2u);
 }
 
 TEST_P(InstrumentCommandsTest, VerboseTellsWhatIsSent) {
-    host.Add("sim");
+    host_.Add("sim");
     const auto told = [this] {
         std::vector<std::string> lines;
-        std::istringstream stream(tool.Log());
+        std::istringstream stream(tool_.Log());
         for (std::string line; std::getline(stream, line);) {
             if (!line.starts_with("ostra: interrupt ")) {  // is waiting for the button meanwhile
                 lines.push_back(line);
@@ -427,16 +427,16 @@ TEST_P(InstrumentCommandsTest, FailuresHaveTheirExitCodesAndNameTheInstrument) {
              Case{"control 1:gone-after", ExitCode::NoInstrument},
              Case{"control 0:stall", ExitCode::InputOutput},
          }) {
-        host.Add("sim");
+        host_.Add("sim");
         SetFaults(row.faults);
         SCOPED_TRACE(row.faults);
         Fail({"readout"}, row.code, Identifier());
-        EXPECT_EQ(tool.Out(), "");
+        EXPECT_EQ(tool_.Out(), "");
     }
 }
 
 TEST_P(InstrumentCommandsTest, AnInstrumentInUseIsSaidToBe) {
-    auto& instrument = host.Add("sim");
+    auto& instrument = host_.Add("sim");
     ASSERT_EQ(instrument.Claim(), Platform::Errors::Success);
     Fail({"readout"}, ExitCode::NotAvailable, Identifier() + ": the instrument is used by another process");
     Succeed({"list"});

@@ -231,23 +231,23 @@ class RegisterTest : public testing::Test {
   protected:
     ExitCode Register(std::vector<std::string> arguments) {
         arguments.insert(arguments.begin(), "register");
-        arguments.insert(arguments.end(), {"--file", file});
-        return tool.Run(arguments);
+        arguments.insert(arguments.end(), {"--file", file_});
+        return tool_.Run(arguments);
     }
     std::string Rules() {
-        const auto bytes = ReadFile(file);
+        const auto bytes = ReadFile(file_);
         return {bytes.begin(), bytes.end()};
     }
 
-    ToolRunner tool;
-    TestFolder folder;
-    const std::string file = folder.Path("rules.d/70-ostra.rules");
+    ToolRunner tool_;
+    TestFolder folder_;
+    const std::string file_ = folder_.Path("rules.d/70-ostra.rules");
 };
 
 TEST_F(RegisterTest, WritesARuleForEachKindOnce) {
-    ASSERT_EQ(Register({"1209:00AB"}), ExitCode::Success) << tool.Err();
-    ASSERT_EQ(Register({"04b4:1003"}), ExitCode::Success) << tool.Err();
-    ASSERT_EQ(Register({"1209:00ab"}), ExitCode::Success) << tool.Err();
+    ASSERT_EQ(Register({"1209:00AB"}), ExitCode::Success) << tool_.Err();
+    ASSERT_EQ(Register({"04b4:1003"}), ExitCode::Success) << tool_.Err();
+    ASSERT_EQ(Register({"1209:00ab"}), ExitCode::Success) << tool_.Err();
     const auto rule = [](const std::string& vendor, const std::string& product) {
         return "SUBSYSTEM==\"usb\", ENV{DEVTYPE}==\"usb_device\", ATTR{idVendor}==\"" + vendor +
                "\", ATTR{idProduct}==\"" + product +
@@ -264,7 +264,7 @@ TEST_F(RegisterTest, LeavesOtherRulesAlone) {
     const std::string others =
         "# mine\nSUBSYSTEM==\"tty\", MODE=\"0666\"\n # " + rules.substr(rules.find("SUBSYSTEM"));
     const auto both = rules + others;
-    WriteFile(file, {both.begin(), both.end()});
+    WriteFile(file_, {both.begin(), both.end()});
     EXPECT_EQ(Register({"1209:0001"}), ExitCode::Success);
     EXPECT_EQ(Rules(), both);
     EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success);
@@ -283,17 +283,17 @@ TEST_F(RegisterTest, KnowsTheRulesOfOlderVersions) {
     };
     constexpr const char* asNow = ", MODE=\"0660\", GROUP=\"plugdev\"";
     const std::string two = header + rule("0001", "") + rule("0002", "");
-    std::filesystem::create_directories(std::filesystem::path(file).parent_path());
-    WriteFile(file, {two.begin(), two.end()});
-    ASSERT_EQ(Register({"1209:0002"}), ExitCode::Success) << tool.Err();
+    std::filesystem::create_directories(std::filesystem::path(file_).parent_path());
+    WriteFile(file_, {two.begin(), two.end()});
+    ASSERT_EQ(Register({"1209:0002"}), ExitCode::Success) << tool_.Err();
     const std::string updated = Rules();
     EXPECT_EQ(updated.substr(updated.find("SUBSYSTEM")), rule("0001", "") + rule("0002", asNow));
     EXPECT_NE(updated.find("the group its members"), std::string::npos) << updated;
 
     const std::string one = header + rule("0001", "");
-    WriteFile(file, {one.begin(), one.end()});
-    EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success) << tool.Err();
-    EXPECT_FALSE(std::filesystem::exists(file)) << Rules();
+    WriteFile(file_, {one.begin(), one.end()});
+    EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success) << tool_.Err();
+    EXPECT_FALSE(std::filesystem::exists(file_)) << Rules();
 }
 
 TEST_F(RegisterTest, TakesARegistrationBack) {
@@ -304,17 +304,17 @@ TEST_F(RegisterTest, TakesARegistrationBack) {
     EXPECT_EQ(Rules().find("\"1209\""), std::string::npos) << Rules();
     EXPECT_NE(Rules().find("\"04b4\""), std::string::npos) << Rules();
     EXPECT_EQ(Register({"04b4:1003", "--remove"}), ExitCode::Success);
-    EXPECT_FALSE(std::filesystem::exists(file)) << "a rule file without rules is of no use";
+    EXPECT_FALSE(std::filesystem::exists(file_)) << "a rule file without rules is of no use";
 }
 
 TEST_F(RegisterTest, DryRunsAndMistakesChangeNothing) {
     EXPECT_EQ(Register({"1209:0001", "--dry-run"}), ExitCode::Success);
-    EXPECT_NE(tool.Out().find("ATTR{idProduct}==\"0001\""), std::string::npos) << tool.Out();
-    EXPECT_FALSE(std::filesystem::exists(file));
+    EXPECT_NE(tool_.Out().find("ATTR{idProduct}==\"0001\""), std::string::npos) << tool_.Out();
+    EXPECT_FALSE(std::filesystem::exists(file_));
     ASSERT_EQ(Register({"1209:0001"}), ExitCode::Success);
     const std::string before = Rules();
     EXPECT_EQ(Register({"1209:0001", "--remove", "--dry-run"}), ExitCode::Success);
-    EXPECT_NE(tool.Out().find("would remove"), std::string::npos) << tool.Out();
+    EXPECT_NE(tool_.Out().find("would remove"), std::string::npos) << tool_.Out();
     for (const char* id : {"1209", "1209:1", "1209-0001", "1209:000g", "1209:00011", "\"1209:0001", ""}) {
         EXPECT_EQ(Register({id}), ExitCode::Usage) << id;
     }

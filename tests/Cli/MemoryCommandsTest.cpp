@@ -25,71 +25,71 @@ EepromImage Calibrated(const char* value) {
 
 class MemoryCommandsTest : public ToolTest {
   protected:
-    MemoryCommandsTest() : instrument(host.Add("sim")) {
+    MemoryCommandsTest() : instrument_(host_.Add("sim")) {
         EepromImage content = Calibrated("77");
         Cli::SetRawWord(content, 10203, 0xCAFE);
         std::fill(content.begin() + 1064, content.begin() + 2048, std::uint8_t{0x5A});
-        instrument.SetEeprom(content);
-        before = instrument.Eeprom();
+        instrument_.SetEeprom(content);
+        before_ = instrument_.Eeprom();
     }
 
-    void ExpectUnchanged() { EXPECT_EQ(instrument.Eeprom(), before); }
+    void ExpectUnchanged() { EXPECT_EQ(instrument_.Eeprom(), before_); }
     std::vector<std::uint32_t> ChangedAddresses() {
-        const EepromImage now = instrument.Eeprom();
+        const EepromImage now = instrument_.Eeprom();
         std::vector<std::uint32_t> addresses;
         for (std::uint32_t at = 0; at < now.size(); ++at) {
-            if (now[at] != before[at]) {
+            if (now[at] != before_[at]) {
                 addresses.push_back(at);
             }
         }
         return addresses;
     }
 
-    Simulator::SimulatedInstrument& instrument;
-    EepromImage before;
-    const std::string image = folder.Path("image");
-    const std::string backup = folder.Path("backup");
+    Simulator::SimulatedInstrument& instrument_;
+    EepromImage before_;
+    const std::string image_ = folder_.Path("image");
+    const std::string backup_ = folder_.Path("backup");
 };
 OSTRA_ON_BOTH_TRANSPORTS(MemoryCommandsTest);
 
 /// And the same command says the same of an image of the instrument.
 TEST_P(MemoryCommandsTest, ReadingChangesNothing) {
-    WriteFile(image, before);
+    WriteFile(image_, before_);
     struct Case {
         Arguments command;
         Arguments image;  ///< what names an image instead; empty: not every command takes one
     };
     for (const Case& row : {
-             Case{{"eeprom", "backup", backup}, {}},
-             Case{{"eeprom", "diff", image}, {}},
+             Case{{"eeprom", "backup", backup_}, {}},
+             Case{{"eeprom", "diff", image_}, {}},
              Case{{"eeprom", "show"}, {}},
-             Case{{"eeprom", "show", "--json"}, {image}},
-             Case{{"eeprom", "check", "--json"}, {"--image", image}},
-             Case{{"calibration", "show", "--json"}, {"--image", image}},
-             Case{{"log", "show", "--json"}, {"--image", image}},
+             Case{{"eeprom", "show", "--json"}, {image_}},
+             Case{{"eeprom", "check", "--json"}, {"--image", image_}},
+             Case{{"calibration", "show", "--json"}, {"--image", image_}},
+             Case{{"log", "show", "--json"}, {"--image", image_}},
              Case{{"ram", "show"}, {}},
-             Case{{"binary", "get", folder.Path("block")}, {}},
-             Case{{"word", "get", "--json"}, {"--image", image}},
+             Case{{"binary", "get", folder_.Path("block")}, {}},
+             Case{{"word", "get", "--json"}, {"--image", image_}},
          }) {
         SetFaults("bulk-out 0+:stall");  // not even the same bytes are written once more
         Succeed(row.command);
         ExpectUnchanged();
         if (!row.image.empty()) {
-            auto ofInstrument = tool.Json();
+            auto ofInstrument = tool_.Json();
             Arguments arguments = row.command;
             arguments.insert(arguments.end(), row.image.begin(), row.image.end());
             Succeed(arguments);
-            ofInstrument["source"] = image;
-            EXPECT_EQ(tool.Json(), ofInstrument);
+            ofInstrument["source"] = image_;
+            EXPECT_EQ(tool_.Json(), ofInstrument);
         }
     }
-    EXPECT_EQ(ReadFile(backup), before);
-    EXPECT_EQ(ReadFile(folder.Path("block")), Cli::BinaryBlockOf(before));
+    EXPECT_EQ(ReadFile(backup_), before_);
+    EXPECT_EQ(ReadFile(folder_.Path("block")), Cli::BinaryBlockOf(before_));
 }
 
 TEST_P(MemoryCommandsTest, ShowTellsWhatIsInTheEeprom) {
     Succeed({"eeprom", "show", "--json"});
-    const auto shown = tool.Json();
+    const auto shown = tool_.Json();
     EXPECT_EQ(shown["source"], Identifier());
     EXPECT_EQ(shown["table"]["length"], 334);
     EXPECT_EQ(shown["table"]["entries"].size(), 55u);
@@ -100,98 +100,98 @@ TEST_P(MemoryCommandsTest, ShowTellsWhatIsInTheEeprom) {
     EXPECT_EQ(shown["words"]["10203"], 0xCAFE);
     EXPECT_EQ(shown["binary"].get<std::string>().substr(0, 4), "5a5a");
     Succeed({"eeprom", "show"});
-    EXPECT_THAT(tool.Out(), HasSubstr("0000CAFE"));
+    EXPECT_THAT(tool_.Out(), HasSubstr("0000CAFE"));
     Succeed({"log", "show"});
-    EXPECT_THAT(tool.Out(), HasSubstr("all 128 elements are 0"));
+    EXPECT_THAT(tool_.Out(), HasSubstr("all 128 elements are 0"));
 }
 
 TEST_P(MemoryCommandsTest, CheckAnswersWithItsExitCode) {
     Succeed({"eeprom", "check"});
-    EepromImage damaged = before;
+    EepromImage damaged = before_;
     damaged[4096] = 7;
-    instrument.SetEeprom(damaged);
+    instrument_.SetEeprom(damaged);
     Fail({"eeprom", "check"}, ExitCode::BadData);
-    EXPECT_THAT(tool.Out(), HasSubstr("error"));
+    EXPECT_THAT(tool_.Out(), HasSubstr("error"));
     Fail({"eeprom", "check", "--json"}, ExitCode::BadData);
-    EXPECT_EQ(tool.Json()["sane"], false);
+    EXPECT_EQ(tool_.Json()["sane"], false);
     for (const Arguments& command : std::vector<Arguments>{{"eeprom", "show"},
                                                            {"calibration", "show"},
                                                            {"calibration", "set", "1211=1"},
                                                            {"log", "show"},
                                                            {"log", "reset"}}) {
         Fail(command, ExitCode::BadData, Identifier() + ": the driver cannot use");
-        EXPECT_THAT(tool.Err(), HasSubstr("`ostra eeprom check --device sim`"));
+        EXPECT_THAT(tool_.Err(), HasSubstr("`ostra eeprom check --device sim`"));
     }
-    Succeed({"eeprom", "backup", backup});  // whatever it holds
-    EXPECT_EQ(ReadFile(backup), damaged);
-    Succeed({"binary", "get", folder.Path("block")});
+    Succeed({"eeprom", "backup", backup_});  // whatever it holds
+    EXPECT_EQ(ReadFile(backup_), damaged);
+    Succeed({"binary", "get", folder_.Path("block")});
 }
 
 TEST_P(MemoryCommandsTest, WriteMakesABackupThatRestores) {
-    WriteFile(image, Calibrated("5"));
-    Succeed({"eeprom", "write", image, "--backup", backup, "--json"});
-    EXPECT_EQ(instrument.Eeprom(), Calibrated("5"));
-    EXPECT_EQ(ReadFile(backup), before);
-    EXPECT_EQ(tool.Json()["backup"], backup);
-    EXPECT_GT(tool.Json()["pieces"], 0);
-    Succeed({"eeprom", "restore", backup});
+    WriteFile(image_, Calibrated("5"));
+    Succeed({"eeprom", "write", image_, "--backup", backup_, "--json"});
+    EXPECT_EQ(instrument_.Eeprom(), Calibrated("5"));
+    EXPECT_EQ(ReadFile(backup_), before_);
+    EXPECT_EQ(tool_.Json()["backup"], backup_);
+    EXPECT_GT(tool_.Json()["pieces"], 0);
+    Succeed({"eeprom", "restore", backup_});
     ExpectUnchanged();
-    Succeed({"eeprom", "restore", backup});
-    EXPECT_THAT(tool.Out(), HasSubstr("nothing to write"));
-    Fail({"eeprom", "write", image, "--backup", backup}, ExitCode::File);
+    Succeed({"eeprom", "restore", backup_});
+    EXPECT_THAT(tool_.Out(), HasSubstr("nothing to write"));
+    Fail({"eeprom", "write", image_, "--backup", backup_}, ExitCode::File);
     ExpectUnchanged();
-    EXPECT_EQ(ReadFile(backup), before) << "a backup is never written over";
+    EXPECT_EQ(ReadFile(backup_), before_) << "a backup is never written over";
 }
 
 TEST_P(MemoryCommandsTest, BackupsGetANameOfTheirOwn) {
-    WriteFile(image, Calibrated("5"));
+    WriteFile(image_, Calibrated("5"));
     const auto previous = std::filesystem::current_path();
-    std::filesystem::current_path(folder.Path(""));
-    Succeed({"eeprom", "write", image, "--json"});
-    const std::string first = tool.Json()["backup"];
+    std::filesystem::current_path(folder_.Path(""));
+    Succeed({"eeprom", "write", image_, "--json"});
+    const std::string first = tool_.Json()["backup"];
     Succeed({"calibration", "set", "1211=6", "--json"});
-    const std::string second = tool.Json()["backup"];
+    const std::string second = tool_.Json()["backup"];
     std::filesystem::current_path(previous);
     EXPECT_TRUE(first.starts_with("ostra-sim-5a0123456789abcd-") && first.ends_with(".eeprom")) << first;
-    EXPECT_EQ(ReadFile(folder.Path(first)), before);
-    EXPECT_EQ(ReadFile(folder.Path(second)), Calibrated("5"));
+    EXPECT_EQ(ReadFile(folder_.Path(first)), before_);
+    EXPECT_EQ(ReadFile(folder_.Path(second)), Calibrated("5"));
 }
 
 TEST_P(MemoryCommandsTest, DryRunsChangeNothingAndLeaveNoFile) {
-    WriteFile(image, Calibrated("5"));
-    WriteFile(folder.Path("block"), std::vector<std::uint8_t>(1904, 1));
+    WriteFile(image_, Calibrated("5"));
+    WriteFile(folder_.Path("block"), std::vector<std::uint8_t>(1904, 1));
     for (const Arguments& command : std::vector<Arguments>{
-             {"eeprom", "write", image},
-             {"eeprom", "restore", image},
+             {"eeprom", "write", image_},
+             {"eeprom", "restore", image_},
              {"calibration", "set", "1211=5"},
              {"log", "reset"},
-             {"binary", "put", folder.Path("block")},
+             {"binary", "put", folder_.Path("block")},
              {"word", "put", "10200=1"},
              {"ram", "set", "2010=5"},
          }) {
-        const auto parameters = ParametersOf(instrument);
+        const auto parameters = ParametersOf(instrument_);
         Arguments arguments = command;
         arguments.insert(arguments.end(), {"--dry-run", "--json"});
         Succeed(arguments);
-        EXPECT_EQ(tool.Json()["dryRun"], true);
+        EXPECT_EQ(tool_.Json()["dryRun"], true);
         ExpectUnchanged();
-        EXPECT_EQ(ParametersOf(instrument), parameters);
+        EXPECT_EQ(ParametersOf(instrument_), parameters);
     }
-    EXPECT_EQ(folder.Files(), (std::vector<std::string>{"block", "image"}));
+    EXPECT_EQ(folder_.Files(), (std::vector<std::string>{"block", "image"}));
 }
 
 TEST_P(MemoryCommandsTest, OnlySaneImagesAreWritten) {
     EepromImage erased(8192, 0xFF);
-    WriteFile(image, erased);
-    Fail({"eeprom", "write", image, "--no-backup"}, ExitCode::BadData);
-    Fail({"eeprom", "restore", image}, ExitCode::BadData);
+    WriteFile(image_, erased);
+    Fail({"eeprom", "write", image_, "--no-backup"}, ExitCode::BadData);
+    Fail({"eeprom", "restore", image_}, ExitCode::BadData);
     ExpectUnchanged();
-    Succeed({"eeprom", "write", image, "--no-backup", "--force"});
-    EXPECT_EQ(instrument.Eeprom(), erased);
-    WriteFile(image, std::vector<std::uint8_t>(8191));
-    EXPECT_EQ(tool.Run({"eeprom", "write", image, "--force"}), ExitCode::BadData)
+    Succeed({"eeprom", "write", image_, "--no-backup", "--force"});
+    EXPECT_EQ(instrument_.Eeprom(), erased);
+    WriteFile(image_, std::vector<std::uint8_t>(8191));
+    EXPECT_EQ(tool_.Run({"eeprom", "write", image_, "--force"}), ExitCode::BadData)
         << "no force makes it an image";
-    Fail({"eeprom", "write", folder.Path("missing")}, ExitCode::File);
+    Fail({"eeprom", "write", folder_.Path("missing")}, ExitCode::File);
 }
 
 TEST_P(MemoryCommandsTest, FilesThatAreMadeReplaceOthersByForceOnly) {
@@ -200,29 +200,29 @@ TEST_P(MemoryCommandsTest, FilesThatAreMadeReplaceOthersByForceOnly) {
         EepromImage content;
     };
     for (const Case& row : {
-             Case{{"eeprom", "backup"}, before},
+             Case{{"eeprom", "backup"}, before_},
              Case{{"eeprom", "new"}, Cli::FreshImage()},
-             Case{{"binary", "get"}, Cli::BinaryBlockOf(before)},
+             Case{{"binary", "get"}, Cli::BinaryBlockOf(before_)},
          }) {
         const auto with = [&row](const Arguments& more) {
             Arguments arguments = row.command;
             arguments.insert(arguments.end(), more.begin(), more.end());
             return arguments;
         };
-        WriteFile(image, {1});
-        Fail(with({image}), ExitCode::File, "--force replaces it");
-        EXPECT_EQ(ReadFile(image), std::vector<std::uint8_t>{1});
-        Succeed(with({image, "--force"}));
-        EXPECT_EQ(ReadFile(image), row.content);
+        WriteFile(image_, {1});
+        Fail(with({image_}), ExitCode::File, "--force replaces it");
+        EXPECT_EQ(ReadFile(image_), std::vector<std::uint8_t>{1});
+        Succeed(with({image_, "--force"}));
+        EXPECT_EQ(ReadFile(image_), row.content);
         for (const char* form : {"--json", "--force"}) {
             Succeed(with({"-", form}));
-            EXPECT_EQ(tool.Out(), std::string(row.content.begin(), row.content.end())) << "and nothing else";
-            EXPECT_NE(tool.Err(), "");
+            EXPECT_EQ(tool_.Out(), std::string(row.content.begin(), row.content.end())) << "and nothing else";
+            EXPECT_NE(tool_.Err(), "");
         }
-        tool.outFacts.isTerminal = true;
+        tool_.outFacts.isTerminal = true;
         Fail(with({"-"}), ExitCode::Usage, "terminal");
-        EXPECT_EQ(tool.Out(), "");
-        tool.outFacts.isTerminal = false;
+        EXPECT_EQ(tool_.Out(), "");
+        tool_.outFacts.isTerminal = false;
     }
 }
 
@@ -239,19 +239,19 @@ class PipedInput final {
         ::close(ends[0]);
     }
     ~PipedInput() {
-        ::dup2(before, STDIN_FILENO);
-        ::close(before);
+        ::dup2(before_, STDIN_FILENO);
+        ::close(before_);
     }
     PipedInput(const PipedInput&) = delete;
     PipedInput& operator=(const PipedInput&) = delete;
 
   private:
-    const int before = ::dup(STDIN_FILENO);
+    const int before_ = ::dup(STDIN_FILENO);
 };
 
 TEST_P(MemoryCommandsTest, ImagesComeFromStandardInputAndGoToStandardOutput) {
     const EepromImage wanted = Calibrated("5");
-    WriteFile(image, wanted);
+    WriteFile(image_, wanted);
     const auto bytes = [](const EepromImage& content) { return std::string(content.begin(), content.end()); };
     struct Case {
         Arguments arguments;
@@ -279,7 +279,7 @@ TEST_P(MemoryCommandsTest, ImagesComeFromStandardInputAndGoToStandardOutput) {
                   ExitCode::BadData,
                   "",
                   "standard input has errors"},
-             Case{{"eeprom", "diff", image, "-"}, wanted, ExitCode::Success, "", ""},
+             Case{{"eeprom", "diff", image_, "-"}, wanted, ExitCode::Success, "", ""},
              Case{{"eeprom", "diff", "-", "-"}, wanted, ExitCode::Usage, "", "standard input"},
              Case{{"calibration", "set", "1211=5", "--image", "/dev/stdin"},
                   wanted,
@@ -289,9 +289,9 @@ TEST_P(MemoryCommandsTest, ImagesComeFromStandardInputAndGoToStandardOutput) {
              Case{{"eeprom", "write", "-", "--backup", "-"},
                   wanted,
                   ExitCode::Success,
-                  bytes(before),
+                  bytes(before_),
                   "written to standard output"},
-             Case{{"write-image", "-"}, before, ExitCode::Success, "", ""},
+             Case{{"write-image", "-"}, before_, ExitCode::Success, "", ""},
              Case{{"eeprom", "restore", "-"}, EepromImage(8191), ExitCode::BadData, "", "it has 8191 bytes"},
              Case{{"eeprom", "restore", "-"},
                   EepromImage(8193),
@@ -304,22 +304,22 @@ TEST_P(MemoryCommandsTest, ImagesComeFromStandardInputAndGoToStandardOutput) {
         SCOPED_TRACE(testing::PrintToString(row.arguments));
         Fail(row.arguments, row.code, row.text);
         if (row.out.empty()) {
-            EXPECT_NE(tool.Out().size(), 8192u);
+            EXPECT_NE(tool_.Out().size(), 8192u);
         } else {
-            EXPECT_EQ(tool.Out(), row.out);
+            EXPECT_EQ(tool_.Out(), row.out);
         }
     }
     ExpectUnchanged();
 }
 
 TEST_P(MemoryCommandsTest, PipesAreNotWaitedForWithoutEnd) {
-    const std::string pipe = folder.Path("pipe");
+    const std::string pipe = folder_.Path("pipe");
     ASSERT_EQ(::mkfifo(pipe.c_str(), 0600), 0);
-    tool.inputPatience = 1;
+    tool_.inputPatience = 1;
     Fail({"eeprom", "check", pipe}, ExitCode::File, "nothing comes from " + pipe);
-    tool.inputPatience = std::numeric_limits<std::uint32_t>::max();
+    tool_.inputPatience = std::numeric_limits<std::uint32_t>::max();
     Cli::Interruption interruption;
-    tool.interruption = &interruption;
+    tool_.interruption = &interruption;
     const auto write = [&](const std::function<void(std::ofstream & file)>& action) {
         return std::thread([&pipe, action] {
             std::ofstream file(pipe, std::ios::binary);  // opened when the tool reads
@@ -328,8 +328,8 @@ TEST_P(MemoryCommandsTest, PipesAreNotWaitedForWithoutEnd) {
     };
     std::thread writer = write([this](std::ofstream& file) {
         // In two pieces.
-        file.write(reinterpret_cast<const char*>(before.data()), 5000).flush();
-        file.write(reinterpret_cast<const char*>(before.data()) + 5000, 3192);
+        file.write(reinterpret_cast<const char*>(before_.data()), 5000).flush();
+        file.write(reinterpret_cast<const char*>(before_.data()) + 5000, 3192);
     });
     Succeed({"eeprom", "diff", pipe, "--device", "sim"});
     writer.join();
@@ -341,77 +341,77 @@ TEST_P(MemoryCommandsTest, PipesAreNotWaitedForWithoutEnd) {
 
 TEST_P(MemoryCommandsTest, AFolderThatTakesNoBackupIsSaidToBe) {
     const auto previous = std::filesystem::current_path();
-    std::filesystem::create_directory(folder.Path("gone"));
-    std::filesystem::current_path(folder.Path("gone"));
-    std::filesystem::remove(folder.Path("gone"));
+    std::filesystem::create_directory(folder_.Path("gone"));
+    std::filesystem::current_path(folder_.Path("gone"));
+    std::filesystem::remove(folder_.Path("gone"));
     for (const Arguments& command :
          std::vector<Arguments>{{"calibration", "set", "1211=5"}, {"word", "put", "10200=9"}}) {
         Fail(command, ExitCode::File, "current folder, and nothing was changed");
-        EXPECT_THAT(tool.Err(), HasSubstr("--backup FILE"));
+        EXPECT_THAT(tool_.Err(), HasSubstr("--backup FILE"));
     }
     ExpectUnchanged();
-    Succeed({"calibration", "set", "1211=5", "--backup", backup});
+    Succeed({"calibration", "set", "1211=5", "--backup", backup_});
     std::filesystem::current_path(previous);
 }
 #endif
 
 /// Wherever a write fails, the tool says how to undo it, and that works.
 TEST_P(MemoryCommandsTest, AFailedWriteTellsTheWayBack) {
-    EepromImage wanted = before;
+    EepromImage wanted = before_;
     std::fill(wanted.begin() + 1100, wanted.begin() + 4000, std::uint8_t{0x77});
-    WriteFile(image, Cli::WithCalibration(wanted, {{1211, "5"}}).image);
+    WriteFile(image_, Cli::WithCalibration(wanted, {{1211, "5"}}).image);
     int failures = 0;
     for (std::uint32_t piece = 0;; ++piece) {
-        instrument.SetEeprom(before);
-        std::filesystem::remove(backup);
+        instrument_.SetEeprom(before_);
+        std::filesystem::remove(backup_);
         SetFaults("bulk-out " + std::to_string(piece) + ":stall");
-        const ExitCode code = tool.Run({"eeprom", "write", image, "--backup", backup, "--force"});
+        const ExitCode code = tool_.Run({"eeprom", "write", image_, "--backup", backup_, "--force"});
         SetFaults("");
         if (code == ExitCode::Success) {
             break;
         }
         ++failures;
-        ASSERT_EQ(code, ExitCode::InputOutput) << tool.Err();
+        ASSERT_EQ(code, ExitCode::InputOutput) << tool_.Err();
         // A piece is its bytes and two terminators; it counts when all three were taken.
-        ASSERT_NE(tool.Err().find("; " + std::to_string(piece / 3) + " of 13 pieces had been sent"),
+        ASSERT_NE(tool_.Err().find("; " + std::to_string(piece / 3) + " of 13 pieces had been sent"),
                   std::string::npos)
-            << piece << ": " << tool.Err();
-        std::string said = tool.Err();
+            << piece << ": " << tool_.Err();
+        std::string said = tool_.Err();
         std::erase(said, '"');  // names with backslashes are quoted
-        ASSERT_NE(said.find("ostra eeprom restore " + backup + " --device sim"), std::string::npos) << said;
-        Succeed({"eeprom", "restore", backup, "--device", "sim"});
+        ASSERT_NE(said.find("ostra eeprom restore " + backup_ + " --device sim"), std::string::npos) << said;
+        Succeed({"eeprom", "restore", backup_, "--device", "sim"});
         ExpectUnchanged();
     }
     EXPECT_GT(failures, 20);
 }
 
 TEST_P(MemoryCommandsTest, CtrlCEndsAWriteBetweenTwoPieces) {
-    EepromImage wanted = before;
+    EepromImage wanted = before_;
     std::fill(wanted.begin() + 5000, wanted.end(), std::uint8_t{0x77});
-    WriteFile(image, wanted);
+    WriteFile(image_, wanted);
     Cli::Interruption interruption;
-    tool.interruption = &interruption;
+    tool_.interruption = &interruption;
     // In the middle of the fifth piece.
     SetFaults("bulk-out 12:late=400");
     After(300'000, [&] { interruption.Request(); });
-    Fail({"eeprom", "write", image, "--backup", backup}, ExitCode::Interrupted);
-    EXPECT_NE(tool.Err().find("interrupted; 5 of 13 pieces"), std::string::npos) << tool.Err();
-    EXPECT_THAT(tool.Err(), HasSubstr("eeprom restore"));
+    Fail({"eeprom", "write", image_, "--backup", backup_}, ExitCode::Interrupted);
+    EXPECT_NE(tool_.Err().find("interrupted; 5 of 13 pieces"), std::string::npos) << tool_.Err();
+    EXPECT_THAT(tool_.Err(), HasSubstr("eeprom restore"));
     // 5000 lies in the piece from 4864 on.
-    EepromImage expected = before;
+    EepromImage expected = before_;
     std::fill(expected.begin() + 5000, expected.begin() + 4864 + 5 * 256, std::uint8_t{0x77});
-    EXPECT_EQ(instrument.Eeprom(), expected);
+    EXPECT_EQ(instrument_.Eeprom(), expected);
 }
 
 TEST_P(MemoryCommandsTest, CalibrationSetWritesItsValuesOnly) {
-    Succeed({"calibration", "set", "1211=0x01020304", "1000=0.5,-2", "--backup", backup});
-    EXPECT_EQ(ReadFile(backup), before);
+    Succeed({"calibration", "set", "1211=0x01020304", "1000=0.5,-2", "--backup", backup_});
+    EXPECT_EQ(ReadFile(backup_), before_);
     const auto changed = ChangedAddresses();
     // 1000 at 4608 was -1.0 twice: 0.5 and -2.0 differ from it in two bytes and one; 1211 at 4708.
     EXPECT_EQ(changed, (std::vector<std::uint32_t>{4608, 4609, 4612, 4613, 4708, 4709, 4710, 4711}));
     Succeed({"calibration", "show", "--json"});
-    EXPECT_EQ(tool.Json()["calibration"]["1211"], 0x01020304);
-    EXPECT_EQ(tool.Json()["calibration"]["1000"], (nlohmann::json{0.5, -2.0}));
+    EXPECT_EQ(tool_.Json()["calibration"]["1211"], 0x01020304);
+    EXPECT_EQ(tool_.Json()["calibration"]["1000"], (nlohmann::json{0.5, -2.0}));
     Succeed({"calibration", "set", "1211=77", "1000=-1,-1", "--no-backup"});
     ExpectUnchanged();
     Fail({"calibration", "set", "1211=1,2"}, ExitCode::Usage);
@@ -419,26 +419,26 @@ TEST_P(MemoryCommandsTest, CalibrationSetWritesItsValuesOnly) {
 }
 
 TEST_P(MemoryCommandsTest, ChangesOfAnImageFileNeedNoInstrument) {
-    host.Bus().Unplug("sim");
-    WriteFile(image, before);
-    WriteFile(folder.Path("block"), std::vector<std::uint8_t>(1904, 9));
-    Succeed({"calibration", "set", "1211=5", "--image", image});
-    Succeed({"word", "put", "10200=7", "10201=0xFFFF0000", "--image", image});
-    Succeed({"binary", "put", folder.Path("block"), "--image", image});
-    Succeed({"log", "reset", "--image", image});
+    host_.Bus().Unplug("sim");
+    WriteFile(image_, before_);
+    WriteFile(folder_.Path("block"), std::vector<std::uint8_t>(1904, 9));
+    Succeed({"calibration", "set", "1211=5", "--image", image_});
+    Succeed({"word", "put", "10200=7", "10201=0xFFFF0000", "--image", image_});
+    Succeed({"binary", "put", folder_.Path("block"), "--image", image_});
+    Succeed({"log", "reset", "--image", image_});
     EepromImage expected = Calibrated("5");
     Cli::SetRawWord(expected, 10200, 7);
     Cli::SetRawWord(expected, 10201, 0xFFFF0000);
     Cli::SetRawWord(expected, 10203, 0xCAFE);
     expected = Cli::WithBinaryBlock(expected, std::vector<std::uint8_t>(1904, 9));
-    EXPECT_EQ(ReadFile(image), expected);
-    EXPECT_EQ(folder.Files(), (std::vector<std::string>{"block", "image"})) << "no backups of files";
-    Fail({"word", "get", "--image", image, "--device", "sim"}, ExitCode::Usage);
-    EXPECT_EQ(tool.Run({"log", "reset", "--image", ""}), ExitCode::Usage) << "does not mean an instrument";
+    EXPECT_EQ(ReadFile(image_), expected);
+    EXPECT_EQ(folder_.Files(), (std::vector<std::string>{"block", "image"})) << "no backups of files";
+    Fail({"word", "get", "--image", image_, "--device", "sim"}, ExitCode::Usage);
+    EXPECT_EQ(tool_.Run({"log", "reset", "--image", ""}), ExitCode::Usage) << "does not mean an instrument";
 }
 
 TEST_P(MemoryCommandsTest, LogIsShownAndBothCopiesAreEmptied) {
-    Cli::ImageModel model(before);
+    Cli::ImageModel model(before_);
     std::vector<std::int32_t> ramp(128);
     std::iota(ramp.begin(), ramp.end(), 77'000);
     model.Get().SetProperty(10010, Cli::Property(ramp));
@@ -446,57 +446,57 @@ TEST_P(MemoryCommandsTest, LogIsShownAndBothCopiesAreEmptied) {
     model.Get().DumpLog();
     EepromImage used = model.Contents();
     used[2048] ^= 1;  // the second copy is damaged
-    instrument.SetEeprom(used);
+    instrument_.SetEeprom(used);
     Succeed({"log", "show", "--json"});
-    EXPECT_EQ(tool.Json()["values"]["10002"], 5);
-    EXPECT_EQ(tool.Json()["secondValid"], false);
+    EXPECT_EQ(tool_.Json()["values"]["10002"], 5);
+    EXPECT_EQ(tool_.Json()["secondValid"], false);
     Succeed({"log", "show"});
-    EXPECT_THAT(tool.Out(), testing::AllOf(HasSubstr("*"), Not(HasSubstr("77001"))));
+    EXPECT_THAT(tool_.Out(), testing::AllOf(HasSubstr("*"), Not(HasSubstr("77001"))));
     Succeed({"log", "show", "--numbers"});
-    EXPECT_THAT(tool.Out(), testing::AllOf(Not(HasSubstr("*")), HasSubstr(" 77001")));
+    EXPECT_THAT(tool_.Out(), testing::AllOf(Not(HasSubstr("*")), HasSubstr(" 77001")));
     Succeed({"log", "reset", "--no-backup"});
-    EXPECT_EQ(instrument.Eeprom(), before);
+    EXPECT_EQ(instrument_.Eeprom(), before_);
 }
 
 TEST_P(MemoryCommandsTest, WordsAndBlockOnAnInstrument) {
     Succeed({"word", "put", "10200=1", "10215=0xFFFFFFFE", "--no-backup"});
     EXPECT_EQ(ChangedAddresses(), (std::vector<std::uint32_t>{4032, 4033, 4034, 4035, 4095}));
     Succeed({"word", "get", "10215", "10216", "--json"});
-    EXPECT_EQ(tool.Json()["words"], (nlohmann::json{{"10215", 0xFFFFFFFE}, {"10216", 0x0001014E}}));
+    EXPECT_EQ(tool_.Json()["words"], (nlohmann::json{{"10215", 0xFFFFFFFE}, {"10216", 0x0001014E}}));
     Fail({"word", "put", "10216=1", "--no-backup"}, ExitCode::Usage);
     Fail({"word", "put", "10200=0x100000000", "--no-backup"}, ExitCode::Usage);
-    WriteFile(folder.Path("block"), std::vector<std::uint8_t>(1903));
-    Fail({"binary", "put", folder.Path("block")}, ExitCode::BadData);
-    WriteFile(folder.Path("block"), std::vector<std::uint8_t>(1904, 4));
-    Succeed({"binary", "put", folder.Path("block"), "--no-backup"});
-    Succeed({"binary", "get", folder.Path("again")});
-    EXPECT_EQ(ReadFile(folder.Path("again")), ReadFile(folder.Path("block")));
+    WriteFile(folder_.Path("block"), std::vector<std::uint8_t>(1903));
+    Fail({"binary", "put", folder_.Path("block")}, ExitCode::BadData);
+    WriteFile(folder_.Path("block"), std::vector<std::uint8_t>(1904, 4));
+    Succeed({"binary", "put", folder_.Path("block"), "--no-backup"});
+    Succeed({"binary", "get", folder_.Path("again")});
+    EXPECT_EQ(ReadFile(folder_.Path("again")), ReadFile(folder_.Path("block")));
 }
 
 TEST_P(MemoryCommandsTest, DiffNamesValuesAndAreas) {
-    WriteFile(image, before);
-    Succeed({"eeprom", "diff", image});
-    WriteFile(backup, Cli::WithCalibration(before, {{1211, "78"}}).image);
-    Fail({"eeprom", "diff", image, backup}, ExitCode::Different);
-    EXPECT_THAT(tool.Out(), HasSubstr("calibration  1211  77 -> 78"));
-    Fail({"eeprom", "diff", backup, "--json"}, ExitCode::Different);
-    EXPECT_EQ(tool.Json()["b"], Identifier());
-    EXPECT_EQ(tool.Json()["values"],
+    WriteFile(image_, before_);
+    Succeed({"eeprom", "diff", image_});
+    WriteFile(backup_, Cli::WithCalibration(before_, {{1211, "78"}}).image);
+    Fail({"eeprom", "diff", image_, backup_}, ExitCode::Different);
+    EXPECT_THAT(tool_.Out(), HasSubstr("calibration  1211  77 -> 78"));
+    Fail({"eeprom", "diff", backup_, "--json"}, ExitCode::Different);
+    EXPECT_EQ(tool_.Json()["b"], Identifier());
+    EXPECT_EQ(tool_.Json()["values"],
               nlohmann::json::parse(R"([{"kind":"calibration","id":1211,"a":78,"b":77}])"));
-    EXPECT_EQ(tool.Json()["areas"][0]["firstDifference"], 4711);
+    EXPECT_EQ(tool_.Json()["areas"][0]["firstDifference"], 4711);
 }
 
 TEST_P(MemoryCommandsTest, NewMakesTheImageOfAFreshInstrument) {
-    Succeed({"eeprom", "new", image});
-    host.Add("fresh");
-    Succeed({"eeprom", "diff", image, "--device", "fresh"});
+    Succeed({"eeprom", "new", image_});
+    host_.Add("fresh");
+    Succeed({"eeprom", "diff", image_, "--device", "fresh"});
 }
 
 TEST_P(MemoryCommandsTest, SeveralInstrumentsMustBeToldApartBeforeOneIsChanged) {
-    host.Add("other");
-    WriteFile(image, Calibrated("5"));
+    host_.Add("other");
+    WriteFile(image_, Calibrated("5"));
     for (const Arguments& command : std::vector<Arguments>{
-             {"write-image", image}, {"eeprom", "write", image}, {"calibration", "set", "1211=5"}}) {
+             {"write-image", image_}, {"eeprom", "write", image_}, {"calibration", "set", "1211=5"}}) {
         Fail(command, ExitCode::Usage, "--device");
     }
     ExpectUnchanged();
@@ -506,9 +506,9 @@ class RamTest : public ToolTest {};
 OSTRA_ON_BOTH_TRANSPORTS(RamTest);
 
 TEST_P(RamTest, TimesFollowTheModeThatTheInstrumentIsIn) {
-    auto& instrument = host.Add("sim");
+    auto& instrument = host_.Add("sim");
     Succeed({"ram", "set", "2009=0.005", "2008=1", "--json"});
-    EXPECT_NEAR(tool.Json()["changes"][0]["after"], 0.004998, 1e-7) << "147 units of 34 us";
+    EXPECT_NEAR(tool_.Json()["changes"][0]["after"], 0.004998, 1e-7) << "147 units of 34 us";
     EXPECT_EQ(ModeOf(instrument), 2);
     EXPECT_EQ(ParametersOf(instrument).p1, 147);
     EXPECT_EQ(ParametersOf(instrument).p4 & 1, 1);
@@ -518,26 +518,26 @@ TEST_P(RamTest, TimesFollowTheModeThatTheInstrumentIsIn) {
     EXPECT_EQ(ParametersOf(instrument).p1, 147);
     EXPECT_EQ(ParametersOf(instrument).p3, 200);
     Succeed({"ram", "show", "--json"});
-    EXPECT_NEAR(tool.Json()["ram"]["2009"], 0.004998, 1e-7);
+    EXPECT_NEAR(tool_.Json()["ram"]["2009"], 0.004998, 1e-7);
 }
 
 TEST_P(RamTest, OldFirmwareHasOneMode) {
     Simulator::InstrumentSettings settings;
     settings.firmware = Simulator::OldFirmware;
-    auto& instrument = host.Add("sim", settings);
+    auto& instrument = host_.Add("sim", settings);
     const auto expectParameters = [&instrument] {
         EXPECT_EQ(ParametersOf(instrument).p1, 1000);
         EXPECT_EQ(ParametersOf(instrument).p2, 10);
     };
     Succeed({"ram", "set", "2009=0.068", "2001=0.0884"});
     expectParameters();
-    EXPECT_EQ(tool.Run({"ram", "set", "2009=4.4565"}), ExitCode::BadData) << "its 16 bits would be cut off";
-    EXPECT_THAT(tool.Err(), HasSubstr("the longest is 4.45638 s"));
+    EXPECT_EQ(tool_.Run({"ram", "set", "2009=4.4565"}), ExitCode::BadData) << "its 16 bits would be cut off";
+    EXPECT_THAT(tool_.Err(), HasSubstr("the longest is 4.45638 s"));
     expectParameters();
 }
 
 TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
-    auto& instrument = host.Add("sim");
+    auto& instrument = host_.Add("sim");
     Succeed({"ram", "set", "2009=0.005"});
     struct Case {
         const char* seconds;
@@ -546,7 +546,7 @@ TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
     for (const Case& row :
          {Case{"10", "Integration time too high"}, Case{"0.0009", "Integration time too low"}}) {
         Fail({"ram", "set", std::string("2009=") + row.seconds}, ExitCode::BadData, row.text);
-        EXPECT_THAT(tool.Err(), HasSubstr("mode 3: 0.001 s to 0.65535 s"));
+        EXPECT_THAT(tool_.Err(), HasSubstr("mode 3: 0.001 s to 0.65535 s"));
         EXPECT_EQ(ModeOf(instrument), 2) << "back in its mode";
     }
     Fail({"ram", "set", "2009=0.05", "2001=600"}, ExitCode::BadData, "the longest is 579.329 s");
@@ -554,21 +554,21 @@ TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
 }
 
 TEST_P(RamTest, RefusesWhatCannotBeSet) {
-    host.Add("sim");
+    host_.Add("sim");
     for (const char* assignment : {"2012=1", "2021=1", "2005=1", "1211=1", "2009=x", "2010=1,2", "2009"}) {
-        EXPECT_EQ(tool.Run({"ram", "set", assignment}), ExitCode::Usage) << assignment;
+        EXPECT_EQ(tool_.Run({"ram", "set", assignment}), ExitCode::Usage) << assignment;
     }
     for (const char* assignment :
          {"2009=-1", "2001=-0.1", "2010=-1", "2010=257", "2010=70000", "2000=2", "9189=65536"}) {
-        EXPECT_EQ(tool.Run({"ram", "set", assignment}), ExitCode::BadData) << assignment;
+        EXPECT_EQ(tool_.Run({"ram", "set", assignment}), ExitCode::BadData) << assignment;
     }
 }
 
 TEST_P(RamTest, TellsWhatElseHasChanged) {
-    auto& instrument = host.Add("sim");
-    EXPECT_EQ(tool.Run({"ram", "set", "9189=300"}), ExitCode::Usage) << "it would have no effect";
+    auto& instrument = host_.Add("sim");
+    EXPECT_EQ(tool_.Run({"ram", "set", "9189=300"}), ExitCode::Usage) << "it would have no effect";
     Succeed({"ram", "set", "9189=300", "2008=1", "--json"});
-    EXPECT_EQ(tool.Json()["changes"], nlohmann::json::parse(R"([{"id":9189,"before":-1,"after":300},
+    EXPECT_EQ(tool_.Json()["changes"], nlohmann::json::parse(R"([{"id":9189,"before":-1,"after":300},
         {"id":2008,"before":0,"after":0},{"id":2010,"before":1,"after":300}])"));
     EXPECT_EQ(ParametersOf(instrument).p3, 300);
 }

@@ -180,39 +180,39 @@ TEST(LiveBlockTest, IsDrawnOverUnlessTheTerminalHasChangedOrCannot) {
 
 class AtomicFileTest : public testing::Test {
   protected:
-    TestFolder folder;
-    const std::string path = folder.Path("file");
-    const std::vector<std::uint8_t> before{1, 2, 3};
-    const std::vector<std::uint8_t> after{9, 8};
+    TestFolder folder_;
+    const std::string path_ = folder_.Path("file");
+    const std::vector<std::uint8_t> before_{1, 2, 3};
+    const std::vector<std::uint8_t> after_{9, 8};
 };
 
 TEST_F(AtomicFileTest, TakesItsNameWhenItIsComplete) {
-    WriteFile(path, before);
+    WriteFile(path_, before_);
     {
-        AtomicFile file(path);
+        AtomicFile file(path_);
         file.Stream() << "half";
         file.Stream().flush();
-        EXPECT_EQ(ReadFile(path), before);
-        EXPECT_EQ(folder.Files().size(), 2u);
+        EXPECT_EQ(ReadFile(path_), before_);
+        EXPECT_EQ(folder_.Files().size(), 2u);
     }
-    EXPECT_EQ(ReadFile(path), before);
-    EXPECT_EQ(folder.Files(), std::vector<std::string>{"file"}) << "the incomplete file stays";
-    WriteFileAtomically(path, after);
-    EXPECT_EQ(ReadFile(path), after);
-    EXPECT_EQ(folder.Files(), std::vector<std::string>{"file"});
+    EXPECT_EQ(ReadFile(path_), before_);
+    EXPECT_EQ(folder_.Files(), std::vector<std::string>{"file"}) << "the incomplete file stays";
+    WriteFileAtomically(path_, after_);
+    EXPECT_EQ(ReadFile(path_), after_);
+    EXPECT_EQ(folder_.Files(), std::vector<std::string>{"file"});
 }
 
 TEST_F(AtomicFileTest, RefusesWhatExistsWhereThatIsWanted) {
-    WriteFile(path, before);
-    EXPECT_THROW(AtomicFile(path, AtomicFile::IfItExists::Refuse), ToolFailure);
-    AtomicFile file(folder.Path("new"), AtomicFile::IfItExists::Refuse);
-    WriteFile(folder.Path("new"), before);  // somebody was faster
+    WriteFile(path_, before_);
+    EXPECT_THROW(AtomicFile(path_, AtomicFile::IfItExists::Refuse), ToolFailure);
+    AtomicFile file(folder_.Path("new"), AtomicFile::IfItExists::Refuse);
+    WriteFile(folder_.Path("new"), before_);  // somebody was faster
     EXPECT_THROW(file.Commit(), ToolFailure);
-    EXPECT_EQ(ReadFile(folder.Path("new")), before);
+    EXPECT_EQ(ReadFile(folder_.Path("new")), before_);
 }
 
 TEST_F(AtomicFileTest, NamesTheFileThatCannotBeWritten) {
-    for (const std::string& name : {folder.Path(""), folder.Path("missing/file")}) {
+    for (const std::string& name : {folder_.Path(""), folder_.Path("missing/file")}) {
         try {
             AtomicFile file(name);
             FAIL() << name;
@@ -229,12 +229,12 @@ class RecordingFileTest : public testing::Test {
     using Action = RecordOutput::Remains (*)(RecordOutput& file);
 
     std::string Content(const std::string& name) {
-        const auto bytes = ReadFile(folder.Path(name));
+        const auto bytes = ReadFile(folder_.Path(name));
         return {bytes.begin(), bytes.end()};
     }
 
-    TestFolder folder;
-    Interruption none;
+    TestFolder folder_;
+    Interruption none_;
 };
 
 TEST_F(RecordingFileTest, Ends) {
@@ -269,53 +269,53 @@ TEST_F(RecordingFileTest, Ends) {
              Case{"left alone, another there", true, 1, nothing, {"f=old", "f.part=head,1,"}, {}},
          }) {
         SCOPED_TRACE(row.name);
-        for (const std::string& name : folder.Files()) {
-            std::filesystem::remove(folder.Path(name));
+        for (const std::string& name : folder_.Files()) {
+            std::filesystem::remove(folder_.Path(name));
         }
         std::filesystem::perms permissions{};
         if (row.existed) {
-            WriteFile(folder.Path("f"), {'o', 'l', 'd'});
-            std::filesystem::permissions(folder.Path("f"), std::filesystem::perms::owner_all);
-            permissions = std::filesystem::status(folder.Path("f")).permissions();
+            WriteFile(folder_.Path("f"), {'o', 'l', 'd'});
+            std::filesystem::permissions(folder_.Path("f"), std::filesystem::perms::owner_all);
+            permissions = std::filesystem::status(folder_.Path("f")).permissions();
         }
         {
-            RecordingFile file(folder.Path("f"), none);
-            EXPECT_THROW(RecordingFile(folder.Path("f"), none), ToolFailure) << "two at once";
+            RecordingFile file(folder_.Path("f"), none_);
+            EXPECT_THROW(RecordingFile(folder_.Path("f"), none_), ToolFailure) << "two at once";
             file.Append(std::string("head,"), 0);
             for (std::uint64_t i = 1; i <= row.records; ++i) {
                 file.Append(std::to_string(i) + ',', 1);
             }
             const auto remains = row.end(file);
             const auto path = [this](const std::string& name) {
-                return name.empty() ? name : folder.Path(name);
+                return name.empty() ? name : folder_.Path(name);
             };
             EXPECT_EQ(remains.file, path(row.remains.file));
             EXPECT_EQ(remains.earlier, path(row.remains.earlier));
         }
         std::vector<std::string> found;
-        for (const std::string& name : folder.Files()) {
+        for (const std::string& name : folder_.Files()) {
             found.push_back(name + '=' + Content(name));
         }
         EXPECT_EQ(found, row.files);
         if (row.existed) {
-            EXPECT_EQ(std::filesystem::status(folder.Path("f")).permissions(), permissions);
+            EXPECT_EQ(std::filesystem::status(folder_.Path("f")).permissions(), permissions);
         }
     }
 }
 
 TEST_F(RecordingFileTest, WhatAKilledRunLeftIsNotTouched) {
-    WriteFile(folder.Path("f.part"), {'k', 'e', 'p', 't'});
+    WriteFile(folder_.Path("f.part"), {'k', 'e', 'p', 't'});
     ExpectThrow<ToolFailure>(
-        folder.Path("f.part") + " exists: another run writes it, or one that was killed left it",
-        [this] { RecordingFile(folder.Path("f"), none); });
+        folder_.Path("f.part") + " exists: another run writes it, or one that was killed left it",
+        [this] { RecordingFile(folder_.Path("f"), none_); });
     EXPECT_EQ(Content("f.part"), "kept");
 }
 
 TEST_F(RecordingFileTest, WhoTakesTheNameMeanwhileKeepsIt) {
-    RecordingFile file(folder.Path("f"), none);
+    RecordingFile file(folder_.Path("f"), none_);
     file.Append(std::string("1"), 1);
-    WriteFile(folder.Path("f"), {'n', 'e', 'w'});
-    EXPECT_EQ(file.KeepWholeRecords().file, folder.Path("f.part"));
+    WriteFile(folder_.Path("f"), {'n', 'e', 'w'});
+    EXPECT_EQ(file.KeepWholeRecords().file, folder_.Path("f.part"));
     EXPECT_EQ(Content("f"), "new");
     EXPECT_EQ(Content("f.part"), "1");
 }
@@ -325,21 +325,21 @@ TEST_F(RecordingFileTest, WhoTakesTheNameMeanwhileKeepsIt) {
 class FullDisk final {
   public:
     explicit FullDisk(rlim_t size) {
-        ::getrlimit(RLIMIT_FSIZE, &limitBefore);
-        handlerBefore = ::signal(SIGXFSZ, SIG_IGN);
-        const rlimit limit{size, limitBefore.rlim_max};
+        ::getrlimit(RLIMIT_FSIZE, &limitBefore_);
+        handlerBefore_ = ::signal(SIGXFSZ, SIG_IGN);
+        const rlimit limit{size, limitBefore_.rlim_max};
         ::setrlimit(RLIMIT_FSIZE, &limit);
     }
     ~FullDisk() {
-        ::setrlimit(RLIMIT_FSIZE, &limitBefore);
-        ::signal(SIGXFSZ, handlerBefore);
+        ::setrlimit(RLIMIT_FSIZE, &limitBefore_);
+        ::signal(SIGXFSZ, handlerBefore_);
     }
     FullDisk(const FullDisk&) = delete;
     FullDisk& operator=(const FullDisk&) = delete;
 
   private:
-    rlimit limitBefore{};
-    void (*handlerBefore)(int) = nullptr;
+    rlimit limitBefore_{};
+    void (*handlerBefore_)(int) = nullptr;
 };
 
 TEST_F(RecordingFileTest, AFullDiskLeavesTheWholeRecords) {
@@ -357,24 +357,24 @@ TEST_F(RecordingFileTest, AFullDiskLeavesTheWholeRecords) {
              Case{"one that is not there as a whole", 1, Form::EqualLength, 0, ""},
          }) {
         SCOPED_TRACE(row.block);
-        RecordingFile file(folder.Path("f"), none);
+        RecordingFile file(folder_.Path("f"), none_);
         {
             const FullDisk full(14);
             file.Append(std::string("head\n"), 0);
-            ExpectThrow<ToolFailure>("cannot write " + folder.Path("f") + ": File too large",
+            ExpectThrow<ToolFailure>("cannot write " + folder_.Path("f") + ": File too large",
                                      [&] { file.Append(row.block, row.records, row.form); });
         }
         EXPECT_EQ(file.Records(), row.kept);
-        EXPECT_EQ(file.KeepWholeRecords().file, row.kept > 0 ? folder.Path("f") : "");
+        EXPECT_EQ(file.KeepWholeRecords().file, row.kept > 0 ? folder_.Path("f") : "");
         EXPECT_EQ(row.kept > 0 ? Content("f") : "", row.content);
-        EXPECT_EQ(std::filesystem::remove(folder.Path("f")), row.kept > 0);
-        EXPECT_EQ(folder.Files().size(), 0u);
+        EXPECT_EQ(std::filesystem::remove(folder_.Path("f")), row.kept > 0);
+        EXPECT_EQ(folder_.Files().size(), 0u);
     }
 }
 
 /// Whatever is waited for: a reader of a FIFO at all, and one that reads.
 TEST_F(RecordingFileTest, AnInterruptionEndsEveryWait) {
-    const std::string fifo = folder.Path("fifo");
+    const std::string fifo = folder_.Path("fifo");
     ASSERT_EQ(::mkfifo(fifo.c_str(), 0600), 0);
     {
         Interruption interruption;
@@ -420,12 +420,12 @@ TEST(WallTimeTextTest, LocalTimeAndItsZone) {
 }
 
 TEST_F(AtomicFileTest, ALinkStaysAndADeviceIsWrittenTo) {
-    WriteFile(path, before);
-    std::filesystem::create_symlink(path, folder.Path("link"));
-    WriteFileAtomically(folder.Path("link"), after);
-    EXPECT_TRUE(std::filesystem::is_symlink(folder.Path("link")));
-    EXPECT_EQ(ReadFile(path), after);
-    WriteFileAtomically("/dev/null", after);
+    WriteFile(path_, before_);
+    std::filesystem::create_symlink(path_, folder_.Path("link"));
+    WriteFileAtomically(folder_.Path("link"), after_);
+    EXPECT_TRUE(std::filesystem::is_symlink(folder_.Path("link")));
+    EXPECT_EQ(ReadFile(path_), after_);
+    WriteFileAtomically("/dev/null", after_);
     EXPECT_TRUE(std::filesystem::is_character_file("/dev/null"));
     for (const std::size_t size : {std::size_t{2}, std::size_t{100'000}}) {  // either way through a buffer
         ExpectThrow<ToolFailure>("cannot write /dev/full: No space left on device", [size] {

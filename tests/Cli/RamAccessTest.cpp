@@ -29,40 +29,40 @@ using State = std::tuple<int, int, int, int, int>;
 class RamAccessTest : public testing::Test {
   protected:
     RamAccessTest() {
-        instrument.misc2 = 301;
-        instrument.describeMode = [this](std::uint8_t mode) {
-            const ModeBytes& bytes = modes.at(mode - 1U);
+        instrument_.misc2 = 301;
+        instrument_.describeMode = [this](std::uint8_t mode) {
+            const ModeBytes& bytes = modes_.at(mode - 1U);
             return std::array<std::uint8_t, 6>{
-                static_cast<std::uint8_t>(modes.size()), mode, 0, bytes.factor, bytes.tick, 0};
+                static_cast<std::uint8_t>(modes_.size()), mode, 0, bytes.factor, bytes.tick, 0};
         };
     }
 
     State StateNow() const {
-        return {instrument.mode, instrument.p1, instrument.p2, instrument.p3, instrument.p4};
+        return {instrument_.mode, instrument_.p1, instrument_.p2, instrument_.p3, instrument_.p4};
     }
     void Put(std::uint8_t mode, std::uint32_t p1) {
-        instrument.mode = mode;
-        instrument.p1 = static_cast<std::uint16_t>(p1);
-        instrument.p2 = static_cast<std::uint16_t>(LongestCount - p1);
-        instrument.p3 = static_cast<std::uint16_t>(p1 % 257);
-        instrument.p4 = static_cast<std::uint8_t>(p1 % 16);
+        instrument_.mode = mode;
+        instrument_.p1 = static_cast<std::uint16_t>(p1);
+        instrument_.p2 = static_cast<std::uint16_t>(LongestCount - p1);
+        instrument_.p3 = static_cast<std::uint16_t>(p1 % 257);
+        instrument_.p4 = static_cast<std::uint8_t>(p1 % 16);
     }
     /// Stores what was just loaded; false when that changes anything.
     bool IsKept() {
         const State before = StateNow();
-        RamAccess ram(commands);
+        RamAccess ram(commands_);
         try {
             ram.Store(ram.Load());
         } catch (const Cli::ToolFailure&) {
             return false;
         }
-        instrument.commands.clear();
+        instrument_.commands.clear();
         return StateNow() == before;
     }
 
-    FakeInstrument instrument;
-    const RamAccess::Commands commands = Open(instrument);
-    std::vector<ModeBytes> modes;
+    FakeInstrument instrument_;
+    const RamAccess::Commands commands_ = Open(instrument_);
+    std::vector<ModeBytes> modes_;
 };
 
 /// The search compares times only with the ends of a mode, so that these are the counts that may get lost.
@@ -72,7 +72,7 @@ TEST_F(RamAccessTest, WhatWasLoadedIsKeptAtTheEndsOfEveryMode) {
     };
     for (std::uint32_t factor = 1; factor <= 255; ++factor) {
         for (std::uint32_t tick = 1; tick <= 255; ++tick) {
-            modes = {{static_cast<std::uint8_t>(factor), static_cast<std::uint8_t>(tick)}, {1, 1}};
+            modes_ = {{static_cast<std::uint8_t>(factor), static_cast<std::uint8_t>(tick)}, {1, 1}};
             const std::uint32_t between = factor + random() % (LongestCount - factor);
             for (const std::uint32_t count : {factor, between, LongestCount}) {
                 Put(1, count);
@@ -87,7 +87,7 @@ TEST_F(RamAccessTest, WhatWasLoadedIsKeptAtEveryCountOfEveryTimeBase) {
     const char* const wish = std::getenv("OSTRA_LONG");
     const std::uint32_t step = wish != nullptr && std::string_view(wish) == "1" ? 1 : 509;
     for (std::uint32_t tick = 1; tick <= 255; ++tick) {
-        modes = {{1, static_cast<std::uint8_t>(tick)}};
+        modes_ = {{1, static_cast<std::uint8_t>(tick)}};
         for (std::uint32_t count = 1 + tick % step; count <= LongestCount; count += step) {
             Put(1, count);
             ASSERT_TRUE(IsKept()) << count << " of " << tick << " us";
@@ -102,7 +102,7 @@ TEST_F(RamAccessTest, WhatWasStoredIsKeptWithAnyNumberOfModes) {
     };
     int stored = 0, roundedIntoAnotherMode = 0;
     const auto store = [&](float seconds) {
-        RamAccess ram(commands);
+        RamAccess ram(commands_);
         auto set = ram.Load();
         set.SetProperty(2009, Property(seconds));
         set.SetProperty(2001, Property(0.0F));
@@ -111,28 +111,28 @@ TEST_F(RamAccessTest, WhatWasStoredIsKeptWithAnyNumberOfModes) {
         } catch (const Cli::ToolFailure&) {
             return false;
         }
-        const std::uint32_t rounded = instrument.p1 * std::uint32_t{modes.at(instrument.mode - 1U).tick};
+        const std::uint32_t rounded = instrument_.p1 * std::uint32_t{modes_.at(instrument_.mode - 1U).tick};
         const bool isTakenEarlier = std::any_of(
-            modes.begin(), modes.begin() + instrument.mode - 1,
+            modes_.begin(), modes_.begin() + instrument_.mode - 1,
             [rounded](const ModeBytes& mode) { return std::uint32_t{mode.factor} * mode.tick <= rounded; });
         ++stored;
         roundedIntoAnotherMode += isTakenEarlier ? 1 : 0;
         return true;
     };
 
-    modes = {{50, 5}, {2, 10}};
+    modes_ = {{50, 5}, {2, 10}};
     Put(1, 1000);
     ASSERT_TRUE(store(0.000247F));
-    EXPECT_EQ(std::pair(int{instrument.mode}, int{instrument.p1}), std::pair(2, 25));
+    EXPECT_EQ(std::pair(int{instrument_.mode}, int{instrument_.p1}), std::pair(2, 25));
     EXPECT_TRUE(IsKept());
 
     for (int round = 0; round < 20000; ++round) {
-        modes.resize(1 + random() % 4);
-        for (ModeBytes& mode : modes) {
+        modes_.resize(1 + random() % 4);
+        for (ModeBytes& mode : modes_) {
             mode = {static_cast<std::uint8_t>(1 + random() % 255),
                     static_cast<std::uint8_t>(1 + random() % 255)};
         }
-        const ModeBytes& aimedAt = modes[random() % modes.size()];
+        const ModeBytes& aimedAt = modes_[random() % modes_.size()];
         const std::uint32_t lowest = std::uint32_t{aimedAt.factor} * aimedAt.tick;
         // Mostly near the end of a mode, where it matters.
         const std::uint32_t microseconds =
@@ -150,16 +150,16 @@ TEST_F(RamAccessTest, WhatWasStoredIsKeptWithAnyNumberOfModes) {
 TEST_F(RamAccessTest, TypedMicrosecondsAreTakenAsTheyAre) {
     for (std::uint32_t factor = 1; factor <= 255; ++factor) {
         for (std::uint32_t tick = 1; tick <= 255; ++tick) {
-            modes = {{static_cast<std::uint8_t>(factor), static_cast<std::uint8_t>(tick)}, {1, 1}};
+            modes_ = {{static_cast<std::uint8_t>(factor), static_cast<std::uint8_t>(tick)}, {1, 1}};
             Put(2, 65000);
-            RamAccess ram(commands);
+            RamAccess ram(commands_);
             auto set = ram.Load();
             set.SetProperty(2001, Property(0.0F));
             set.SetProperty(2009, Property(static_cast<float>(factor * tick * 1e-6)));
             ram.Store(set);
-            ASSERT_EQ(std::pair(int{instrument.mode}, std::uint32_t{instrument.p1}), std::pair(1, factor))
+            ASSERT_EQ(std::pair(int{instrument_.mode}, std::uint32_t{instrument_.p1}), std::pair(1, factor))
                 << factor << " x " << tick;
-            instrument.commands.clear();
+            instrument_.commands.clear();
         }
     }
 }

@@ -23,9 +23,9 @@ class ScanTest : public ToolTest {
   protected:
     std::vector<std::uint8_t> ScanRaw(Arguments arguments) {
         arguments.insert(arguments.begin(), "scan");
-        arguments.insert(arguments.end(), {"--raw", "--output", folder.Path("raw")});
+        arguments.insert(arguments.end(), {"--raw", "--output", folder_.Path("raw")});
         Succeed(arguments);
-        return ReadFile(folder.Path("raw"));
+        return ReadFile(folder_.Path("raw"));
     }
     /// For a text in which a question mark is any character.
     static std::string RegexOf(std::string text) {
@@ -42,7 +42,7 @@ class ScanTest : public ToolTest {
 OSTRA_ON_BOTH_TRANSPORTS(ScanTest);
 
 TEST_P(ScanTest, FixedScansHaveTheirSize) {
-    host.Add("sim", Streaming(10'000'000));
+    host_.Add("sim", Streaming(10'000'000));
     for (const std::size_t records : {1u, 2u, 11u, 300u, 1000u}) {
         const auto bytes = ScanRaw({"--records", std::to_string(records)});
         EXPECT_EQ(bytes.size(), records * RecordSize);
@@ -58,7 +58,7 @@ TEST_P(ScanTest, FixedScansHaveTheirSize) {
 
 TEST_P(ScanTest, OpenEndedScansEndWithTheInstrument) {
     for (const std::size_t records : {1u, 40u, 2560u}) {
-        host.Add("sim", Streaming(records * RecordSize));
+        host_.Add("sim", Streaming(records * RecordSize));
         const auto bytes = ScanRaw({});
         EXPECT_EQ(bytes.size(), records * RecordSize);
         ExpectRecordsInOrder(bytes);
@@ -66,7 +66,7 @@ TEST_P(ScanTest, OpenEndedScansEndWithTheInstrument) {
 }
 
 TEST_P(ScanTest, CsvHasTheNumbersAndTheColumnsThatAreAskedFor) {
-    host.Add("sim", Streaming(8 * RecordSize, 2048));
+    host_.Add("sim", Streaming(8 * RecordSize, 2048));
     const auto bytes = ScanRaw({});
     std::string values, names;
     for (std::size_t i = 0; i < RecordSize; i += 2) {
@@ -88,12 +88,12 @@ TEST_P(ScanTest, CsvHasTheNumbersAndTheColumnsThatAreAskedFor) {
              Case{{"--header", "--time"}, "seconds," + names, when + values},
              Case{{"--number", "--time"}, "", "1," + when + values},
          }) {
-        host.Add("sim", Streaming(8 * RecordSize, 2048));
+        host_.Add("sim", Streaming(8 * RecordSize, 2048));
         Arguments arguments = row.options;
         arguments.insert(arguments.begin(), "scan");
         Succeed(arguments);
-        EXPECT_THAT(tool.Err(), HasSubstr("8 records of 256 bytes"));
-        auto lines = tool.Lines();
+        EXPECT_THAT(tool_.Err(), HasSubstr("8 records of 256 bytes"));
+        auto lines = tool_.Lines();
         if (!row.head.empty()) {
             ASSERT_FALSE(lines.empty());
             EXPECT_EQ(lines.front(), row.head);
@@ -110,31 +110,31 @@ TEST_P(ScanTest, CsvHasTheNumbersAndTheColumnsThatAreAskedFor) {
 }
 
 TEST_P(ScanTest, OtherRecordSizes) {
-    host.Add("sim", Streaming(100'000));
+    host_.Add("sim", Streaming(100'000));
     Succeed({"scan", "--record-size", "8", "--records", "100"});
-    EXPECT_EQ(tool.Lines().size(), 100u);
-    for (const std::string& line : tool.Lines()) {
+    EXPECT_EQ(tool_.Lines().size(), 100u);
+    for (const std::string& line : tool_.Lines()) {
         ASSERT_EQ(std::count(line.begin(), line.end(), ','), 3) << line;
     }
     EXPECT_EQ(ScanRaw({"--record-size", "6553", "--records", "3"}).size(), 3u * 6553);
-    EXPECT_EQ(tool.Run({"scan", "--record-size", "7"}), ExitCode::Usage) << "no 16-bit values";
+    EXPECT_EQ(tool_.Run({"scan", "--record-size", "7"}), ExitCode::Usage) << "no 16-bit values";
 }
 
 TEST_P(ScanTest, SummaryAsJson) {
-    host.Add("sim", Streaming(4096));
-    Succeed({"scan", "--json", "--output", folder.Path("csv")});
-    EXPECT_EQ(tool.Json()["records"], 16);
-    EXPECT_EQ(tool.Json()["bytes"], 4096);
-    EXPECT_EQ(tool.Json()["file"], folder.Path("csv"));
-    EXPECT_EQ(tool.Json()["ended"], "complete");
-    EXPECT_EQ(tool.Err(), "");
+    host_.Add("sim", Streaming(4096));
+    Succeed({"scan", "--json", "--output", folder_.Path("csv")});
+    EXPECT_EQ(tool_.Json()["records"], 16);
+    EXPECT_EQ(tool_.Json()["bytes"], 4096);
+    EXPECT_EQ(tool_.Json()["file"], folder_.Path("csv"));
+    EXPECT_EQ(tool_.Json()["ended"], "complete");
+    EXPECT_EQ(tool_.Err(), "");
 }
 
 TEST_P(ScanTest, ProgressOnATerminalOnly) {
-    tool.errFacts.isTerminal = tool.errFacts.movesCursor = true;
-    host.Add("sim", Streaming(1'000'000));
-    Succeed({"scan", "--total", "512000", "--output", folder.Path("csv")});
-    EXPECT_THAT(tool.Err(), HasSubstr("512.0 kB of 512.0 kB"));
+    tool_.errFacts.isTerminal = tool_.errFacts.movesCursor = true;
+    host_.Add("sim", Streaming(1'000'000));
+    Succeed({"scan", "--total", "512000", "--output", folder_.Path("csv")});
+    EXPECT_THAT(tool_.Err(), HasSubstr("512.0 kB of 512.0 kB"));
 }
 
 /// Whatever ends a scan too early: what came is kept, as whole records and beside a file that was there, and
@@ -152,7 +152,7 @@ TEST_P(ScanTest, WhatCameIsKept) {
     const std::vector<Case> cases{
         {"interrupted", "", [](auto& user) { user.Request(); }, ExitCode::Interrupted, "interrupted",
          "scan interrupted; "},
-        {"unplugged", "", [this](auto&) { host.Bus().Unplug("sim"); }, ExitCode::NoInstrument, "unplugged",
+        {"unplugged", "", [this](auto&) { host_.Bus().Unplug("sim"); }, ExitCode::NoInstrument, "unplugged",
          ""},
         {"silent", "bulk-in 4+:silent", {}, ExitCode::Timeout, "timeout", ""},
         {"silent at once",
@@ -172,48 +172,48 @@ TEST_P(ScanTest, WhatCameIsKept) {
                 continue;  // it is as long as the instrument makes it
             }
             SCOPED_TRACE(std::string(row.name) + ", " + kind);
-            auto& instrument = host.Add("sim", Streaming(100'000'000, 100'000));
+            auto& instrument = host_.Add("sim", Streaming(100'000'000, 100'000));
             SetFaults(row.faults);
             if (how == "there") {
-                WriteFile(folder.Path("raw"), {1});
+                WriteFile(folder_.Path("raw"), {1});
             }
             Cli::Interruption interruption;
-            tool.interruption = &interruption;
+            tool_.interruption = &interruption;
             const auto event = After(5'000'000, [&] { row.event ? row.event(interruption) : void(); });
-            Arguments arguments{"scan", "--raw", "--json", "--timeout", "2", "--output", folder.Path("raw")};
+            Arguments arguments{"scan", "--raw", "--json", "--timeout", "2", "--output", folder_.Path("raw")};
             if (how == "discarded") {
                 arguments.push_back("--discard");
             }
             if (how != "open-ended") {
                 arguments.insert(arguments.end(), {"--records", "25000"});
             }
-            const Stopwatch watch(clock);
+            const Stopwatch watch(clock_);
             Fail(arguments, row.code, row.text);
             watch.ExpectAtMost(row.code == ExitCode::Interrupted ? 5'100 : 25'000);
             Platform::ClockScheduler().Forget(event);
-            EXPECT_EQ(tool.Json()["ended"], row.ended);
+            EXPECT_EQ(tool_.Json()["ended"], row.ended);
 
             const bool isKept = row.hasRecords && how != "discarded";
-            const std::string kept = folder.Path(how == "there" ? "raw.part" : "raw");
-            EXPECT_EQ(tool.Json()["file"], isKept ? nlohmann::json(kept) : nlohmann::json());
+            const std::string kept = folder_.Path(how == "there" ? "raw.part" : "raw");
+            EXPECT_EQ(tool_.Json()["file"], isKept ? nlohmann::json(kept) : nlohmann::json());
             if (isKept) {
                 const auto bytes = ReadFile(kept);
                 EXPECT_GT(bytes.size(), 0u);
-                EXPECT_EQ(bytes.size(), tool.Json()["records"].get<std::size_t>() * RecordSize);
-                EXPECT_LT(tool.Json()["bytes"].get<std::size_t>() - bytes.size(), RecordSize);
+                EXPECT_EQ(bytes.size(), tool_.Json()["records"].get<std::size_t>() * RecordSize);
+                EXPECT_LT(tool_.Json()["bytes"].get<std::size_t>() - bytes.size(), RecordSize);
                 ExpectRecordsInOrder(bytes);
-                EXPECT_THAT(tool.Err(), HasSubstr(std::to_string(bytes.size() / RecordSize) +
-                                                  " records were written to " + kept));
+                EXPECT_THAT(tool_.Err(), HasSubstr(std::to_string(bytes.size() / RecordSize) +
+                                                   " records were written to " + kept));
                 std::filesystem::remove(kept);
             }
-            EXPECT_EQ(folder.Files().size(), how == "there" ? 1u : 0u);
+            EXPECT_EQ(folder_.Files().size(), how == "there" ? 1u : 0u);
             if (how == "there") {
-                EXPECT_EQ(ReadFile(folder.Path("raw")), std::vector<std::uint8_t>{1});
-                std::filesystem::remove(folder.Path("raw"));
+                EXPECT_EQ(ReadFile(folder_.Path("raw")), std::vector<std::uint8_t>{1});
+                std::filesystem::remove(folder_.Path("raw"));
             }
             EXPECT_EQ(instrument.PendingTransfers(), 0u);
             EXPECT_FALSE(instrument.Claimed());
-            tool.interruption = nullptr;
+            tool_.interruption = nullptr;
             if (std::string(row.name) == "interrupted") {
                 EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 2u);
                 Succeed({"readout"});
@@ -223,9 +223,9 @@ TEST_P(ScanTest, WhatCameIsKept) {
 }
 
 TEST_P(ScanTest, OutputThatCannotBeWrittenEndsAScan) {
-    auto& instrument = host.Add("sim", Streaming(100'000'000, 100'000));
-    tool.CloseOut();
-    const Stopwatch watch(clock);
+    auto& instrument = host_.Add("sim", Streaming(100'000'000, 100'000));
+    tool_.CloseOut();
+    const Stopwatch watch(clock_);
     Fail({"scan"}, ExitCode::File, "the output cannot be written");
     watch.ExpectAtMost(2'000);
     EXPECT_EQ(instrument.PendingTransfers(), 0u);
@@ -233,33 +233,33 @@ TEST_P(ScanTest, OutputThatCannotBeWrittenEndsAScan) {
 
 /// Wherever it comes: while the instrument is opened, waited for, scanned, closed.
 TEST_P(ScanTest, CtrlCAtAnyTime) {
-    host.Add("sim", Streaming(102'400, 40'000));
+    host_.Add("sim", Streaming(102'400, 40'000));
     int interrupted = 0;
     for (std::uint64_t after = 0; after < 4'000; after += 100) {
         SCOPED_TRACE(after);
         Cli::Interruption interruption;
-        tool.interruption = &interruption;
+        tool_.interruption = &interruption;
         const auto event = After(after * 1000, [&] { interruption.Request(); });
-        const Stopwatch watch(clock);
-        const ExitCode code = tool.Run({"scan", "--raw", "--output", folder.Path("raw")});
+        const Stopwatch watch(clock_);
+        const ExitCode code = tool_.Run({"scan", "--raw", "--output", folder_.Path("raw")});
         Platform::ClockScheduler().Forget(event);
         constexpr std::uint32_t ending = 50;
         watch.ExpectAtMost(code == ExitCode::Interrupted ? static_cast<std::uint32_t>(after) + ending
                                                          : 8'000);
-        ASSERT_TRUE(code == ExitCode::Interrupted || code == ExitCode::Success) << tool.Err();
+        ASSERT_TRUE(code == ExitCode::Interrupted || code == ExitCode::Success) << tool_.Err();
         interrupted += code == ExitCode::Interrupted ? 1 : 0;
-        for (const std::string& name : folder.Files()) {
+        for (const std::string& name : folder_.Files()) {
             EXPECT_EQ(name, "raw");
-            const auto bytes = ReadFile(folder.Path(name));
+            const auto bytes = ReadFile(folder_.Path(name));
             EXPECT_GT(bytes.size(), 0u);
             EXPECT_EQ(bytes.size() % RecordSize, 0u);
             ExpectRecordsInOrder(bytes);
-            std::filesystem::remove(folder.Path(name));
+            std::filesystem::remove(folder_.Path(name));
         }
     }
     EXPECT_GT(interrupted, 20);
-    tool.interruption = nullptr;
-    Succeed({"scan", "--output", folder.Path("csv")});
+    tool_.interruption = nullptr;
+    Succeed({"scan", "--output", folder_.Path("csv")});
 }
 
 /// However the data are cut into transfers.

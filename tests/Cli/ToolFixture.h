@@ -22,23 +22,23 @@ using Arguments = std::vector<std::string>;
 class ToolRunner {
   public:
     Cli::ExitCode Run(const Arguments& arguments) {
-        out.str({});
-        err.str({});
-        log.str({});
-        Cli::Surroundings surroundings{out, err, log, outFacts, errFacts, inputPatience};
+        out_.str({});
+        err_.str({});
+        log_.str({});
+        Cli::Surroundings surroundings{out_, err_, log_, outFacts, errFacts, inputPatience};
         Cli::Interruption none;
         return Cli::RunTool(arguments, surroundings, interruption != nullptr ? *interruption : none);
     }
     /// From now on nothing can be written to standard output.
-    void CloseOut() { out.setstate(std::ios::badbit); }
-    std::string Out() const { return out.str(); }
-    std::string Err() const { return err.str(); }
+    void CloseOut() { out_.setstate(std::ios::badbit); }
+    std::string Out() const { return out_.str(); }
+    std::string Err() const { return err_.str(); }
     /// The lines of --verbose.
-    std::string Log() const { return log.str(); }
-    nlohmann::json Json() const { return nlohmann::json::parse(out.str()); }
+    std::string Log() const { return log_.str(); }
+    nlohmann::json Json() const { return nlohmann::json::parse(out_.str()); }
     std::vector<std::string> Lines() const {
         std::vector<std::string> lines;
-        std::istringstream stream(out.str());
+        std::istringstream stream(out_.str());
         for (std::string line; std::getline(stream, line);) {
             lines.push_back(line);
         }
@@ -50,7 +50,7 @@ class ToolRunner {
     Cli::Interruption* interruption = nullptr;
 
   private:
-    std::ostringstream out, err, log;
+    std::ostringstream out_, err_, log_;
 };
 
 /// The tool on a host with simulated instruments, on both transports, in virtual time.
@@ -58,16 +58,16 @@ class ToolTest : public testing::TestWithParam<Transport> {
   protected:
     /// Succeeds, or the test fails with what the tool said.
     void Succeed(const Arguments& arguments) {
-        EXPECT_EQ(tool.Run(arguments), Cli::ExitCode::Success) << tool.Err();
+        EXPECT_EQ(tool_.Run(arguments), Cli::ExitCode::Success) << tool_.Err();
     }
     /// Fails with this code, and tells the user of it with `text`.
     void Fail(const Arguments& arguments, Cli::ExitCode code, const std::string& text = "") {
-        EXPECT_EQ(tool.Run(arguments), code) << testing::PrintToString(arguments) << ": " << tool.Err();
-        EXPECT_THAT(tool.Err(), testing::HasSubstr(text)) << testing::PrintToString(arguments);
+        EXPECT_EQ(tool_.Run(arguments), code) << testing::PrintToString(arguments) << ": " << tool_.Err();
+        EXPECT_THAT(tool_.Err(), testing::HasSubstr(text)) << testing::PrintToString(arguments);
     }
-    std::string Identifier(const std::string& name = "sim") const { return host.Identifier(name); }
+    std::string Identifier(const std::string& name = "sim") const { return host_.Identifier(name); }
     void SetFaults(const std::string& plan) {
-        host.Bus().SetFaults("sim", Simulator::FaultPlan::Parse(plan));
+        host_.Bus().SetFaults("sim", Simulator::FaultPlan::Parse(plan));
     }
     /// Has something happen, so many microseconds from now.
     static Platform::EventScheduler::EventId After(std::uint64_t microseconds, std::function<void()> event) {
@@ -81,10 +81,10 @@ class ToolTest : public testing::TestWithParam<Transport> {
         return instrument.WithCommands([](const auto& commands) { return commands.mode; });
     }
 
-    TestClock clock{TestTime::Virtual};
-    SimulatedHost host{GetParam()};
-    ToolRunner tool;
-    TestFolder folder;
+    TestClock clock_{TestTime::Virtual};
+    SimulatedHost host_{GetParam()};
+    ToolRunner tool_;
+    TestFolder folder_;
 };
 
 inline std::string NameOfTransport(const testing::TestParamInfo<Transport>& info) {

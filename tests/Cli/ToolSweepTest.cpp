@@ -94,8 +94,8 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
         std::uint32_t hits = 0;
     };
 
-    const Transport transport = std::get<0>(GetParam());
-    const Command& command = Commands()[std::get<1>(GetParam())];
+    const Transport transport_ = std::get<0>(GetParam());
+    const Command& command_ = Commands()[std::get<1>(GetParam())];
 
     static Files FilesIn(const TestFolder& folder) {
         Files files;
@@ -107,16 +107,16 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
 
     Result Run(const FaultPlan& plan) const {
         const TestClock clock(TestTime::Virtual, 1);
-        SimulatedHost host(transport);
+        SimulatedHost host(transport_);
         Simulator::InstrumentSettings settings;
-        settings.scanBytes = command.recording != nullptr ? 30 * RecordSize : Protocol::ReadoutBytes;
+        settings.scanBytes = command_.recording != nullptr ? 30 * RecordSize : Protocol::ReadoutBytes;
         auto& instrument = host.Add("sim", settings);
         const TestFolder folder;
         WriteFile(folder.Path("image"), ImageToWrite());
         WriteFile(folder.Path("block"), Bytes(Cli::BinaryBlockOf(ImageToWrite()).size(), 0x3C));
         const auto script = host.Bus().SetFaults("sim", plan);
         Arguments arguments;
-        for (const std::string& argument : command.arguments) {
+        for (const std::string& argument : command_.arguments) {
             arguments.push_back(argument.starts_with('@') ? folder.Path(argument.substr(1)) : argument);
         }
 
@@ -145,16 +145,16 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
         const bool isEnd = fault.scope == FaultScope::BulkIn &&
                            (fault.kind == FaultKind::Short || fault.kind == FaultKind::Empty);
         // What is sent to an instrument it takes as a whole, so that a driver need not say how much went.
-        const bool isUntold = transport == Transport::Native && fault.scope == FaultScope::Control &&
+        const bool isUntold = transport_ == Transport::Native && fault.scope == FaultScope::Control &&
                               fault.kind == FaultKind::Empty;
-        const bool isTrusted = command.data != Data::Checked &&
-                               (isWrongData || (isEnd && command.data == Data::TrustedOpen) || isUntold);
+        const bool isTrusted = command_.data != Data::Checked &&
+                               (isWrongData || (isEnd && command_.data == Data::TrustedOpen) || isUntold);
         // A transfer that reaches a pipe late lets the one behind it take its data: no real one does.
-        const bool isOvertaken = command.recording != nullptr && fault.scope == FaultScope::BulkIn &&
+        const bool isOvertaken = command_.recording != nullptr && fault.scope == FaultScope::BulkIn &&
                                  fault.kind == FaultKind::Late;
         // Whatever the interrupt pipe brings is a press of the button.
         const bool isEvent =
-            command.showsEvents &&
+            command_.showsEvents &&
             (Unplugs(fault) || (fault.scope == FaultScope::Interrupt && fault.kind == FaultKind::Empty));
         return isTrusted || isOvertaken || isEvent;
     }
@@ -192,7 +192,7 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
         for (const auto& [name, content] : result.files) {
             if (name == "backup") {
                 EXPECT_EQ(content, result.memoryBefore) << "the backup is not what was there";
-            } else if (command.recording != nullptr && name == command.recording) {
+            } else if (command_.recording != nullptr && name == command_.recording) {
                 const Bytes& all = undisturbed.files.at(name);
                 EXPECT_GT(content.size(), 0U);
                 EXPECT_EQ(content.size() % RecordSize, 0U);

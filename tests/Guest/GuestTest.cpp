@@ -71,8 +71,8 @@ class PluggedInstrument final {
     explicit PluggedInstrument(std::vector<std::string> arguments) {
         EXPECT_TRUE(WaitFor(&AllPortsFree)) << "the port does not become free";
         arguments.insert(arguments.begin(), {"/root/ostra-simulator", "--attach"});
-        process = fork();
-        if (process == 0) {
+        process_ = fork();
+        if (process_ == 0) {
             std::vector<char*> words;
             for (std::string& argument : arguments) {
                 words.push_back(argument.data());
@@ -92,15 +92,15 @@ class PluggedInstrument final {
     PluggedInstrument& operator=(const PluggedInstrument&) = delete;
 
     void Unplug() {
-        if (process > 0) {
-            kill(process, SIGKILL);
-            waitpid(process, nullptr, 0);
-            process = -1;
+        if (process_ > 0) {
+            kill(process_, SIGKILL);
+            waitpid(process_, nullptr, 0);
+            process_ = -1;
         }
     }
 
   private:
-    pid_t process = -1;
+    pid_t process_ = -1;
 };
 
 std::string LastError() {

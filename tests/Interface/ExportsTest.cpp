@@ -32,19 +32,19 @@ std::vector<std::uint8_t> CountingImage() {
 
 class Exports : public testing::TestWithParam<Transport> {
   protected:
-    TestClock clock{TestTime::Virtual, 1};
-    SimulatedHost host{GetParam()};
-    Simulator::TransferRecorder recorder;
-    std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
+    TestClock clock_{TestTime::Virtual, 1};
+    SimulatedHost host_{GetParam()};
+    Simulator::TransferRecorder recorder_;
+    std::array<std::int32_t, OSTRA_READOUT_VALUES> values_{};
 
     void Record() {
-        host.Bus().WrapDevices([this](const std::string&, auto device) { return recorder.Record(device); });
+        host_.Bus().WrapDevices([this](const std::string&, auto device) { return recorder_.Record(device); });
     }
     /// The recorded transfers as text, those of the interrupt endpoint left out: when they happen is the
     /// listener thread's business.
     std::vector<std::string> Transcript() const {
         std::vector<std::string> lines;
-        for (const auto& transfer : recorder.Transfers()) {
+        for (const auto& transfer : recorder_.Transfers()) {
             if (transfer.endpoint != Protocol::InterruptInEndpoint) {
                 lines.push_back(transfer.Text(8));
             }
@@ -56,15 +56,15 @@ INSTANTIATE_TEST_SUITE_P(Transports, Exports, testing::Values(Transport::Native,
                          [](const auto& parameter) { return std::string(Name(parameter.param)); });
 
 TEST_P(Exports, ReadoutSendsItsFixedSequenceAndReturnsTheSensorsValues) {
-    auto& instrument = host.Add("one");
+    auto& instrument = host_.Add("one");
     Record();
-    const Stopwatch stopwatch(clock);
-    ASSERT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_OK) << LastError();
+    const Stopwatch stopwatch(clock_);
+    ASSERT_EQ(d4fb86cecc88582a(values_.data(), ""), OSTRA_OK) << LastError();
     stopwatch.ExpectBetween(1000, 1099);
     EXPECT_EQ(LastError(), "");
-    EXPECT_EQ(values[0], values[1]);
-    EXPECT_EQ(values[127], values[126]);
-    EXPECT_NE(*std::ranges::max_element(values), *std::ranges::min_element(values));
+    EXPECT_EQ(values_[0], values_[1]);
+    EXPECT_EQ(values_[127], values_[126]);
+    EXPECT_NE(*std::ranges::max_element(values_), *std::ranges::min_element(values_));
     EXPECT_FALSE(instrument.Claimed());
     EXPECT_EQ(instrument.PendingTransfers(), 0U);
 
@@ -78,10 +78,10 @@ TEST_P(Exports, ReadoutSendsItsFixedSequenceAndReturnsTheSensorsValues) {
 }
 
 TEST_P(Exports, ImageGoesIn32PiecesAndArrivesWhole) {
-    auto& instrument = host.Add("one");
+    auto& instrument = host_.Add("one");
     Record();
     const auto image = CountingImage();
-    ASSERT_EQ(f3355d91d5df0e0b(image.data(), host.Identifier("one").c_str()), OSTRA_OK) << LastError();
+    ASSERT_EQ(f3355d91d5df0e0b(image.data(), host_.Identifier("one").c_str()), OSTRA_OK) << LastError();
     EXPECT_EQ(instrument.Eeprom(), image);
     EXPECT_FALSE(instrument.Claimed());
     const auto lines = Transcript();
@@ -101,34 +101,34 @@ TEST_P(Exports, WithoutAnInstrumentTheTextIsEmpty) {
     const auto image = CountingImage();
     EXPECT_EQ(f3355d91d5df0e0b(image.data(), ""), OSTRA_UNKNOWN_FAILURE);
     EXPECT_EQ(LastError(), "");
-    EXPECT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_FAILURE);
+    EXPECT_EQ(d4fb86cecc88582a(values_.data(), ""), OSTRA_FAILURE);
     EXPECT_EQ(LastError(), "");
-    EXPECT_THAT(values, Each(0));
+    EXPECT_THAT(values_, Each(0));
 }
 
 TEST_P(Exports, TheNamedInstrumentIsTaken) {
-    auto& first = host.Add("a");
-    auto& second = host.Add("b");
+    auto& first = host_.Add("a");
+    auto& second = host_.Add("b");
     Record();
     const auto image = CountingImage();
     const auto untouched = first.Eeprom();
-    ASSERT_EQ(f3355d91d5df0e0b(image.data(), host.Identifier("b").c_str()), OSTRA_OK) << LastError();
+    ASSERT_EQ(f3355d91d5df0e0b(image.data(), host_.Identifier("b").c_str()), OSTRA_OK) << LastError();
     EXPECT_EQ(second.Eeprom(), image);
     EXPECT_EQ(first.Eeprom(), untouched);
     // The one before it was opened and reset as well.
     EXPECT_EQ(std::ranges::count(Transcript(), "control CA out 1: 1F"), 2);
 
-    EXPECT_EQ(f3355d91d5df0e0b(image.data(), host.Identifier("B").c_str()), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_EQ(f3355d91d5df0e0b(image.data(), host_.Identifier("B").c_str()), OSTRA_UNKNOWN_FAILURE);
     EXPECT_EQ(LastError(), "");
     first.Unplug();
-    EXPECT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_OK);
+    EXPECT_EQ(d4fb86cecc88582a(values_.data(), ""), OSTRA_OK);
 }
 
 TEST_P(Exports, AnInstrumentThatDoesNotOpenIsPassedOver) {
-    host.Add("a");
-    auto& second = host.Add("b");
-    host.Bus().WrapDevices([this](const std::string& name, auto device) {
-        auto recorded = recorder.Record(device);
+    host_.Add("a");
+    auto& second = host_.Add("b");
+    host_.Bus().WrapDevices([this](const std::string& name, auto device) {
+        auto recorded = recorder_.Record(device);
         if (name == "a") {
             EXPECT_EQ(device->Claim(), 0U);  // somebody else has it
         }
@@ -140,11 +140,11 @@ TEST_P(Exports, AnInstrumentThatDoesNotOpenIsPassedOver) {
 }
 
 TEST_P(Exports, NullPointersAreRefusedAndTextsFollowTheirRules) {
-    host.Add("one");
+    host_.Add("one");
     EXPECT_EQ(f3355d91d5df0e0b(nullptr, ""), OSTRA_UNKNOWN_FAILURE);
     EXPECT_EQ(LastError(), "unknown error");
     EXPECT_EQ(f3355d91d5df0e0b(CountingImage().data(), nullptr), OSTRA_UNKNOWN_FAILURE);
-    EXPECT_EQ(d4fb86cecc88582a(values.data(), nullptr), OSTRA_UNKNOWN_FAILURE);
+    EXPECT_EQ(d4fb86cecc88582a(values_.data(), nullptr), OSTRA_UNKNOWN_FAILURE);
     const std::function<void()> clearing[] = {
         [] { EXPECT_THAT(b5ae189db26b2a1b("SDKVersion"), StrEq("1.0.3")); },
         [] { EXPECT_THAT(b5ae189db26b2a1b("sdkversion"), StrEq("")); },

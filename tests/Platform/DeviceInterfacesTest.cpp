@@ -38,15 +38,15 @@ class Interfaces : public testing::Test {
     static constexpr auto Class = Protocol::UsbIoDriver::InterfaceClass;
 
     void SetUp() override {
-        files.paths = {"usbio/first", "", "usbio/third"};
-        list = DeviceInterfaces::MakeList(Class, false);
-        ASSERT_NE(list, nullptr);
+        files_.paths = {"usbio/first", "", "usbio/third"};
+        list_ = DeviceInterfaces::MakeList(Class, false);
+        ASSERT_NE(list_, nullptr);
     }
-    void TearDown() override { EXPECT_TRUE(DeviceInterfaces::DestroyList(list)); }
+    void TearDown() override { EXPECT_TRUE(DeviceInterfaces::DestroyList(list_)); }
 
-    ListedFiles files;
-    const ScopedDeviceFiles replaced{files};
-    DeviceList list = nullptr;
+    ListedFiles files_;
+    const ScopedDeviceFiles replaced_{files_};
+    DeviceList list_ = nullptr;
 };
 
 std::vector<std::byte> Detail(std::size_t size, std::uint32_t sizeField = InterfaceDetailSizeField) {
@@ -57,14 +57,14 @@ std::vector<std::byte> Detail(std::size_t size, std::uint32_t sizeField = Interf
 }
 
 TEST_F(Interfaces, AreASnapshotInTheOrderOfTheFiles) {
-    const std::vector<std::string> expected = files.paths;
-    files.paths.clear();
+    const std::vector<std::string> expected = files_.paths;
+    files_.paths.clear();
     InterfaceRecord record;
     std::vector<std::string> found;
-    for (std::uint32_t index = 0; DeviceInterfaces::Find(list, Class, index, record); ++index) {
+    for (std::uint32_t index = 0; DeviceInterfaces::Find(list_, Class, index, record); ++index) {
         EXPECT_EQ(record.interfaceClass, Class);
-        std::vector<std::byte> detail = Detail(DeviceInterfaces::DetailSize(list, record));
-        ASSERT_TRUE(DeviceInterfaces::ReadDetail(list, record, detail));
+        std::vector<std::byte> detail = Detail(DeviceInterfaces::DetailSize(list_, record));
+        ASSERT_TRUE(DeviceInterfaces::ReadDetail(list_, record, detail));
         EXPECT_EQ(detail.back(), std::byte{0});
         found.emplace_back(reinterpret_cast<const char*>(detail.data() + InterfaceDetailPathOffset));
         EXPECT_EQ(detail.size(), InterfaceDetailPathOffset + found.back().size() + 1);
@@ -72,19 +72,19 @@ TEST_F(Interfaces, AreASnapshotInTheOrderOfTheFiles) {
     EXPECT_EQ(LastError(), Errors::NoMoreItems);
     EXPECT_EQ(found, expected);
     SetLastError(Errors::Success);
-    EXPECT_FALSE(DeviceInterfaces::Find(list, Protocol::NativeDriver::InterfaceClass, 0, record));
+    EXPECT_FALSE(DeviceInterfaces::Find(list_, Protocol::NativeDriver::InterfaceClass, 0, record));
     EXPECT_EQ(LastError(), Errors::NoMoreItems) << "of another class";
 }
 
 TEST_F(Interfaces, NeedTheSizesThatTheSystemExpects) {
     InterfaceRecord wrongSize;
     wrongSize.size = 32;
-    EXPECT_FALSE(DeviceInterfaces::Find(list, Class, 0, wrongSize));
+    EXPECT_FALSE(DeviceInterfaces::Find(list_, Class, 0, wrongSize));
     EXPECT_EQ(LastError(), Errors::InvalidParameter);
 
     InterfaceRecord record;
-    ASSERT_TRUE(DeviceInterfaces::Find(list, Class, 0, record));
-    const std::uint32_t size = DeviceInterfaces::DetailSize(list, record);
+    ASSERT_TRUE(DeviceInterfaces::Find(list_, Class, 0, record));
+    const std::uint32_t size = DeviceInterfaces::DetailSize(list_, record);
     struct {
         std::vector<std::byte> detail;
         ErrorCode code;
@@ -94,12 +94,12 @@ TEST_F(Interfaces, NeedTheSizesThatTheSystemExpects) {
                  {Detail(3), Errors::InsufficientBuffer}};
     for (auto& failing : cases) {
         const std::vector<std::byte> before = failing.detail;
-        EXPECT_FALSE(DeviceInterfaces::ReadDetail(list, record, failing.detail));
+        EXPECT_FALSE(DeviceInterfaces::ReadDetail(list_, record, failing.detail));
         EXPECT_EQ(LastError(), failing.code);
         EXPECT_EQ(failing.detail, before) << "a failed read must not write";
     }
     const InterfaceRecord neverFilled;
-    EXPECT_EQ(DeviceInterfaces::DetailSize(list, neverFilled), 0u);
+    EXPECT_EQ(DeviceInterfaces::DetailSize(list_, neverFilled), 0u);
 }
 
 TEST_F(Interfaces, OfUnknownListsAreRefused) {

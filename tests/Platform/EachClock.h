@@ -24,12 +24,12 @@ class EachClock : public testing::TestWithParam<int> {
   protected:
     void SetUp() override {
         if (GetParam() != RealClock) {
-            clock.emplace(static_cast<std::uint64_t>(GetParam()));
+            clock_.emplace(static_cast<std::uint64_t>(GetParam()));
         }
     }
 
   private:
-    std::optional<Simulator::VirtualClock> clock;
+    std::optional<Simulator::VirtualClock> clock_;
 #else
     static constexpr int Seeds = 0;
 #endif

@@ -18,29 +18,29 @@ inline constexpr std::uint32_t LongTimeout = 20'000;
 class TestThread final {
   public:
     explicit TestThread(std::function<void()> threadBody)
-        : body(std::move(threadBody)), handle(StartThread(Run, this)) {
-        EXPECT_TRUE(handle);
+        : body_(std::move(threadBody)), handle_(StartThread(Run, this)) {
+        EXPECT_TRUE(handle_);
     }
     ~TestThread() { Join(); }
     TestThread(const TestThread&) = delete;
     TestThread& operator=(const TestThread&) = delete;
 
     void Join() {
-        if (handle) {
-            EXPECT_EQ(Wait(handle.Get(), LongTimeout), WaitResult::Signalled) << "the thread does not end";
-            handle.Reset();
+        if (handle_) {
+            EXPECT_EQ(Wait(handle_.Get(), LongTimeout), WaitResult::Signalled) << "the thread does not end";
+            handle_.Reset();
         }
     }
-    Handle Get() const { return handle.Get(); }
+    Handle Get() const { return handle_.Get(); }
 
   private:
     static std::uint32_t Run(void* argument) {
-        static_cast<TestThread*>(argument)->body();
+        static_cast<TestThread*>(argument)->body_();
         return 0;
     }
 
-    const std::function<void()> body;
-    OwnedHandle handle;
+    const std::function<void()> body_;
+    OwnedHandle handle_;
 };
 
 }  // namespace Varnholt::Platform

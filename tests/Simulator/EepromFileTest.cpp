@@ -27,10 +27,10 @@ class EepromFileTest : public testing::Test {
     std::shared_ptr<SimulatedInstrument> MakeInstrument(EepromFile& file) {
         InstrumentSettings settings;
         if (file.Exists()) {
-            settings.eeprom = ReadEepromFile(fileName);
+            settings.eeprom = ReadEepromFile(fileName_);
         }
         settings.memoryChanged = [&file] { file.MemoryChanged(); };
-        auto instrument = std::make_shared<SimulatedInstrument>(loop, settings);
+        auto instrument = std::make_shared<SimulatedInstrument>(loop_, settings);
         file.Keep(instrument);
         return instrument;
     }
@@ -42,38 +42,38 @@ class EepromFileTest : public testing::Test {
         EXPECT_EQ(1, data.completions);
     }
     void RunLoopFor(std::uint64_t microseconds) {
-        loop.CallAt(loop.Now() + microseconds, [this] { loop.Stop(); });
-        loop.Run();
+        loop_.CallAt(loop_.Now() + microseconds, [this] { loop_.Stop(); });
+        loop_.Run();
     }
 
-    const Tests::TestFolder folder;
-    const std::string fileName = folder.Path("eeprom.bin");
-    PollLoop loop;
-    std::vector<std::string> complaints;
-    const Log log = [this](const std::string& line) { complaints.push_back(line); };
+    const Tests::TestFolder folder_;
+    const std::string fileName_ = folder_.Path("eeprom.bin");
+    PollLoop loop_;
+    std::vector<std::string> complaints_;
+    const Log log_ = [this](const std::string& line) { complaints_.push_back(line); };
 };
 
 TEST_F(EepromFileTest, MemoryIsThereAgainAfterARestart) {
     {
-        EepromFile file(loop, fileName, log);
+        EepromFile file(loop_, fileName_, log_);
         const auto instrument = MakeInstrument(file);
-        EXPECT_EQ(FreshEeprom(), ReadEepromFile(fileName)) << "it exists from the start";
+        EXPECT_EQ(FreshEeprom(), ReadEepromFile(fileName_)) << "it exists from the start";
         WriteByte(*instrument, 7, 42);
         WriteByte(*instrument, 8, 43);
         RunLoopFor(300'000);
-        EXPECT_EQ(43, ReadEepromFile(fileName)[8]) << "and is written while the program runs";
+        EXPECT_EQ(43, ReadEepromFile(fileName_)[8]) << "and is written while the program runs";
         WriteByte(*instrument, 9, 44);
         EXPECT_TRUE(file.Finish());
     }
-    EepromFile file(loop, fileName, log);
+    EepromFile file(loop_, fileName_, log_);
     const auto instrument = MakeInstrument(file);
     Bytes expected = FreshEeprom();
     expected[7] = 42;
     expected[8] = 43;
     expected[9] = 44;
     EXPECT_EQ(expected, instrument->Eeprom());
-    EXPECT_EQ(1U, folder.Files().size()) << "nothing else is left";
-    EXPECT_TRUE(complaints.empty());
+    EXPECT_EQ(1U, folder_.Files().size()) << "nothing else is left";
+    EXPECT_TRUE(complaints_.empty());
 }
 
 TEST_F(EepromFileTest, UnusableFilesAreExplained) {
@@ -83,49 +83,49 @@ TEST_F(EepromFileTest, UnusableFilesAreExplained) {
     };
     for (const Case& test : {Case{0, "has 0 bytes, but an EEPROM has 8192"}, Case{8191, "has 8191 bytes"},
                              Case{8193, "remove this one to begin with a fresh EEPROM"}}) {
-        Tests::WriteFile(fileName, Bytes(test.size));
+        Tests::WriteFile(fileName_, Bytes(test.size));
         try {
-            ReadEepromFile(fileName);
+            ReadEepromFile(fileName_);
             ADD_FAILURE() << test.size;
         } catch (const std::runtime_error& error) {
             EXPECT_THAT(error.what(), HasSubstr(test.explanation));
         }
     }
-    EXPECT_THROW(ReadEepromFile(folder.Path("none")), std::runtime_error);
-    EXPECT_THROW(ReadEepromFile(folder.Path("")), std::runtime_error);
+    EXPECT_THROW(ReadEepromFile(folder_.Path("none")), std::runtime_error);
+    EXPECT_THROW(ReadEepromFile(folder_.Path("")), std::runtime_error);
 }
 
 TEST_F(EepromFileTest, AFileThatCannotBeWrittenIsRefusedAtTheStart) {
-    const auto instrument = std::make_shared<SimulatedInstrument>(loop);
+    const auto instrument = std::make_shared<SimulatedInstrument>(loop_);
     const std::string longest(250, 'x');  // the new file beside it would have too long a name
-    Tests::WriteFile(folder.Path(longest), FreshEeprom());
+    Tests::WriteFile(folder_.Path(longest), FreshEeprom());
     for (const std::string& name : {std::string("missing/eeprom.bin"), longest}) {
-        EepromFile file(loop, folder.Path(name), log);
+        EepromFile file(loop_, folder_.Path(name), log_);
         try {
             file.Keep(instrument);
             ADD_FAILURE() << name;
         } catch (const std::runtime_error& error) {
-            EXPECT_THAT(error.what(), HasSubstr("cannot write " + folder.Path(name)));
+            EXPECT_THAT(error.what(), HasSubstr("cannot write " + folder_.Path(name)));
         }
         file.MemoryChanged();
         EXPECT_FALSE(file.Finish());
     }
-    EXPECT_EQ(FreshEeprom(), ReadEepromFile(folder.Path(longest)));
-    EXPECT_EQ(1U, folder.Files().size());
+    EXPECT_EQ(FreshEeprom(), ReadEepromFile(folder_.Path(longest)));
+    EXPECT_EQ(1U, folder_.Files().size());
 }
 
 TEST_F(EepromFileTest, FailureToWriteIsToldAndTheMemoryKept) {
-    std::filesystem::create_directory(folder.Path("removed"));
-    EepromFile file(loop, folder.Path("removed/eeprom.bin"), log);
-    file.Keep(std::make_shared<SimulatedInstrument>(loop));
-    std::filesystem::remove_all(folder.Path("removed"));
+    std::filesystem::create_directory(folder_.Path("removed"));
+    EepromFile file(loop_, folder_.Path("removed/eeprom.bin"), log_);
+    file.Keep(std::make_shared<SimulatedInstrument>(loop_));
+    std::filesystem::remove_all(folder_.Path("removed"));
     file.MemoryChanged();
     EXPECT_FALSE(file.Finish());
-    ASSERT_EQ(1U, complaints.size());
-    EXPECT_THAT(complaints.front(), HasSubstr("cannot write"));
-    std::filesystem::create_directory(folder.Path("removed"));
+    ASSERT_EQ(1U, complaints_.size());
+    EXPECT_THAT(complaints_.front(), HasSubstr("cannot write"));
+    std::filesystem::create_directory(folder_.Path("removed"));
     EXPECT_TRUE(file.Finish());
-    EXPECT_EQ(FreshEeprom(), ReadEepromFile(folder.Path("removed/eeprom.bin")));
+    EXPECT_EQ(FreshEeprom(), ReadEepromFile(folder_.Path("removed/eeprom.bin")));
 }
 
 }  // namespace

@@ -39,14 +39,14 @@ class FaultInjectorTest : public testing::Test {
         }
         InstrumentSettings settings;
         settings.eeprom = content;
-        bus.Add("one", settings);
+        bus_.Add("one", settings);
     }
-    ~FaultInjectorTest() override { EXPECT_EQ(0U, bus.Instrument("one").PendingTransfers()); }
+    ~FaultInjectorTest() override { EXPECT_EQ(0U, bus_.Instrument("one").PendingTransfers()); }
 
     std::shared_ptr<UsbDevice> Open(const std::string& plan) {
-        bus.SetFaults("one", FaultPlan::Parse(plan));
+        bus_.SetFaults("one", FaultPlan::Parse(plan));
         Platform::ErrorCode error = Errors::Success;
-        return bus.Open("one", error);
+        return bus_.Open("one", error);
     }
     /// Has the instrument send its memory from `address` on.
     static void AskForMemory(UsbDevice& device, std::uint32_t address) {
@@ -60,8 +60,8 @@ class FaultInjectorTest : public testing::Test {
         return bytes;
     }
 
-    ManualScheduler scheduler;
-    SimulatedBus bus{scheduler};
+    ManualScheduler scheduler_;
+    SimulatedBus bus_{scheduler_};
 };
 
 TEST_F(FaultInjectorTest, FaultsOfABulkReadAndWhatComesNext) {
@@ -138,7 +138,7 @@ TEST_F(FaultInjectorTest, FaultsOfABulkWrite) {
              Case{"gone-during", TransferStatus::DeviceGone, 2, {0x11, 0x22, 2, 3}},
              Case{"gone-after", TransferStatus::Completed, 4, sent},
          }) {
-        SimulatedInstrument& instrument = bus.Instrument("one");
+        SimulatedInstrument& instrument = bus_.Instrument("one");
         Bytes content = instrument.Eeprom();
         std::ranges::copy(old, content.begin());
         instrument.SetEeprom(content);
@@ -200,7 +200,7 @@ TEST_F(FaultInjectorTest, SilentTransferEndsWithItsCancellationOnly) {
     TestTransfer request = TestTransfer::Vendor(Request::Reset, {31});
     device->Submit(hit);
     device->Submit(request);
-    scheduler.Advance(3'600'000'000);
+    scheduler_.Advance(3'600'000'000);
     for (TestTransfer* transfer : {&hit, &request}) {
         EXPECT_EQ(0, transfer->completions);
         device->Cancel(*transfer);
@@ -216,14 +216,14 @@ TEST_F(FaultInjectorTest, LateTransferReachesTheInstrumentLater) {
     AskForMemory(*device, 10);
     TestTransfer cancelled = TestTransfer::In(BulkInEndpoint, ReadLength);
     device->Submit(cancelled);
-    scheduler.Advance(19'999);
+    scheduler_.Advance(19'999);
     device->Cancel(cancelled);
     EXPECT_EQ(TransferStatus::Cancelled, cancelled.status);
     TestTransfer hit = TestTransfer::In(BulkInEndpoint, ReadLength);
     device->Submit(hit);
-    scheduler.Advance(19'999);
+    scheduler_.Advance(19'999);
     EXPECT_EQ(0, hit.completions);
-    scheduler.Advance(1);
+    scheduler_.Advance(1);
     EXPECT_EQ(Memory(10, ReadLength), hit.Data()) << "nothing was lost to the cancelled one";
     EXPECT_EQ(1, cancelled.completions);
 
@@ -232,7 +232,7 @@ TEST_F(FaultInjectorTest, LateTransferReachesTheInstrumentLater) {
     device.reset();
     EXPECT_EQ(1, last.completions) << "it does not outlive the device";
     EXPECT_EQ(TransferStatus::Cancelled, last.status);
-    EXPECT_EQ(0U, scheduler.Waiting());
+    EXPECT_EQ(0U, scheduler_.Waiting());
 }
 
 /// Wherever the memory runs out, a transfer is refused or ends, once, and nothing is waited for at the end.
@@ -314,12 +314,12 @@ TEST_F(FaultInjectorTest, GoneDeviceEndsEverythingAndStaysGone) {
         TestTransfer after = TestTransfer::In(BulkInEndpoint, ReadLength);
         EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(after)) << kind;
         EXPECT_EQ(Errors::DeviceNotConnected, device->Claim()) << kind;
-        EXPECT_TRUE(bus.List().empty()) << kind;
+        EXPECT_TRUE(bus_.List().empty()) << kind;
 
-        bus.PlugIn("one");
+        bus_.PlugIn("one");
         EXPECT_EQ(Errors::DeviceNotConnected, device->Claim()) << kind;
         Platform::ErrorCode error = Errors::Success;
-        const auto again = bus.Open("one", error);
+        const auto again = bus_.Open("one", error);
         EXPECT_EQ(Errors::Success, again->Claim()) << kind;
         AskForMemory(*again, 10);
     }

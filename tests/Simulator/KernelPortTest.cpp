@@ -20,10 +20,10 @@ constexpr const char* Free = " 004 000 00000000 000000 0-0\n";
 
 class KernelPortTest : public testing::Test {
   protected:
-    void Write(const std::string& name, const std::string& text) { std::ofstream(files.Path(name)) << text; }
+    void Write(const std::string& name, const std::string& text) { std::ofstream(files_.Path(name)) << text; }
 
-    const Tests::TestFolder files;
-    const std::string folder = files.Path("");
+    const Tests::TestFolder files_;
+    const std::string folder_ = files_.Path("");
 };
 
 TEST_F(KernelPortTest, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
@@ -45,31 +45,31 @@ TEST_F(KernelPortTest, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
              Case{"super speed only", {"ss  0015" + std::string(Free)}, ""},
              Case{"all used", {port0 + Attached, port30 + Attached}, ""},
          }) {
-        std::filesystem::remove_all(folder);
-        std::filesystem::create_directory(folder);
+        std::filesystem::remove_all(folder_);
+        std::filesystem::create_directory(folder_);
         Write("attach", "");
         for (std::size_t i = 0; i < test.controllers.size(); ++i) {
             Write("status" + (i == 0 ? "" : "." + std::to_string(i)), Heading + test.controllers[i]);
         }
         if (test.order.empty()) {
-            EXPECT_THROW(PlugIntoKernel(7, 0x10002, folder), std::runtime_error) << test.name;
+            EXPECT_THROW(PlugIntoKernel(7, 0x10002, folder_), std::runtime_error) << test.name;
             continue;
         }
-        EXPECT_EQ(std::stoul(test.order), PlugIntoKernel(7, 0x10002, folder)) << test.name;
-        std::ifstream written(files.Path("attach"));
+        EXPECT_EQ(std::stoul(test.order), PlugIntoKernel(7, 0x10002, folder_)) << test.name;
+        std::ifstream written(files_.Path("attach"));
         EXPECT_EQ(test.order, std::string(std::istreambuf_iterator<char>(written), {})) << test.name;
     }
 }
 
 TEST_F(KernelPortTest, SaysWhatToDoWhereThereIsNoSuchHost) {
     try {
-        PlugIntoKernel(7, 0x10002, files.Path("missing"));
+        PlugIntoKernel(7, 0x10002, files_.Path("missing"));
         ADD_FAILURE();
     } catch (const std::runtime_error& error) {
         EXPECT_THAT(error.what(), testing::HasSubstr("modprobe vhci-hcd"));
     }
     Write("status", Heading + std::string("hs  0000") + Free);
-    EXPECT_THROW(PlugIntoKernel(7, 0x10002, folder), std::runtime_error) << "nothing to write the order to";
+    EXPECT_THROW(PlugIntoKernel(7, 0x10002, folder_), std::runtime_error) << "nothing to write the order to";
 }
 
 }  // namespace

@@ -21,17 +21,17 @@ namespace Varnholt::Simulator {
 /// A server with its loop on a thread of its own, as if it were another program.
 class ServerThread final {
   public:
-    ServerThread() : wake(eventfd(0, EFD_CLOEXEC)), server(std::make_unique<UsbIpServer>(loop, Log())) {
-        loop.Watch(wake, POLLIN, [this] { DoTasks(); });
-        thread = std::thread([this] { loop.Run(); });
+    ServerThread() : wake_(eventfd(0, EFD_CLOEXEC)), server_(std::make_unique<UsbIpServer>(loop_, Log())) {
+        loop_.Watch(wake_, POLLIN, [this] { DoTasks(); });
+        thread_ = std::thread([this] { loop_.Run(); });
     }
     ~ServerThread() {
         Do([this] {
-            server.reset();
-            loop.Stop();
+            server_.reset();
+            loop_.Stop();
         });
-        thread.join();
-        close(wake);
+        thread_.join();
+        close(wake_);
     }
     ServerThread(const ServerThread&) = delete;
     ServerThread& operator=(const ServerThread&) = delete;
@@ -44,8 +44,8 @@ class ServerThread final {
 
     std::shared_ptr<SimulatedInstrument> Add(const std::string& name, const InstrumentSettings& settings = {},
                                              const std::string& faults = "") {
-        auto instrument = std::make_shared<SimulatedInstrument>(loop, settings);
-        Do([&] { server->Add({name, instrument, FaultPlan::Parse(faults), {}}); });
+        auto instrument = std::make_shared<SimulatedInstrument>(loop_, settings);
+        Do([&] { server_->Add({name, instrument, FaultPlan::Parse(faults), {}}); });
         return instrument;
     }
 
@@ -54,18 +54,18 @@ class ServerThread final {
         std::packaged_task<void()> packaged(std::move(task));
         auto done = packaged.get_future();
         {
-            const std::lock_guard lock(mutex);
-            tasks.push_back(std::move(packaged));
+            const std::lock_guard lock(mutex_);
+            tasks_.push_back(std::move(packaged));
         }
-        eventfd_write(wake, 1);
+        eventfd_write(wake_, 1);
         done.get();
     }
     /// Lets the server's time jump.
     void Advance(std::uint64_t microseconds) {
-        Do([&] { loop.ahead += microseconds; });
+        Do([&] { loop_.ahead += microseconds; });
     }
-    UsbIpServer& Server() { return *server; }
-    PollLoop& Loop() { return loop; }
+    UsbIpServer& Server() { return *server_; }
+    PollLoop& Loop() { return loop_; }
 
   private:
     struct AdvancedLoop final : PollLoop {
@@ -75,23 +75,23 @@ class ServerThread final {
 
     void DoTasks() {
         eventfd_t count = 0;
-        eventfd_read(wake, &count);
+        eventfd_read(wake_, &count);
         std::vector<std::packaged_task<void()>> now;
         {
-            const std::lock_guard lock(mutex);
-            now.swap(tasks);
+            const std::lock_guard lock(mutex_);
+            now.swap(tasks_);
         }
         for (auto& task : now) {
             task();
         }
     }
 
-    const int wake;
-    AdvancedLoop loop;
-    std::unique_ptr<UsbIpServer> server;
-    std::mutex mutex;  // guards `tasks`
-    std::vector<std::packaged_task<void()>> tasks;
-    std::thread thread;
+    const int wake_;
+    AdvancedLoop loop_;
+    std::unique_ptr<UsbIpServer> server_;
+    std::mutex mutex_;  // guards `tasks`
+    std::vector<std::packaged_task<void()>> tasks_;
+    std::thread thread_;
 };
 
 }  // namespace Varnholt::Simulator

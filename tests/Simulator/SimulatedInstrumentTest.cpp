@@ -24,14 +24,14 @@ class SimulatedInstrumentTest : public testing::Test {
   protected:
     /// Submits a transfer that must be done at once and answers its data.
     Bytes Do(TestTransfer& transfer) {
-        EXPECT_EQ(Errors::Success, instrument.Submit(transfer));
+        EXPECT_EQ(Errors::Success, instrument_.Submit(transfer));
         EXPECT_EQ(1, transfer.completions);
         EXPECT_EQ(TransferStatus::Completed, transfer.status);
         return transfer.Data();
     }
     Bytes Do(TestTransfer&& transfer) { return Do(transfer); }
     TransferStatus StatusOf(TestTransfer&& transfer) {
-        EXPECT_EQ(Errors::Success, instrument.Submit(transfer));
+        EXPECT_EQ(Errors::Success, instrument_.Submit(transfer));
         EXPECT_EQ(1, transfer.completions);
         return transfer.status;
     }
@@ -40,8 +40,8 @@ class SimulatedInstrumentTest : public testing::Test {
         return Do(TestTransfer::In(BulkInEndpoint, length));
     }
 
-    ManualScheduler scheduler;
-    SimulatedInstrument instrument{scheduler};
+    ManualScheduler scheduler_;
+    SimulatedInstrument instrument_{scheduler_};
 };
 
 TEST_F(SimulatedInstrumentTest, WrittenMemoryIsReadBack) {
@@ -55,9 +55,9 @@ TEST_F(SimulatedInstrumentTest, WrittenMemoryIsReadBack) {
     EXPECT_EQ(piece, ReadEeprom(7936, 256));
 
     TestTransfer nobodyExpectsThis = TestTransfer::Out(BulkOutEndpoint, {0});
-    instrument.Submit(nobodyExpectsThis);
+    instrument_.Submit(nobodyExpectsThis);
     EXPECT_EQ(0, nobodyExpectsThis.completions) << "a third closing byte must wait";
-    instrument.Cancel(nobodyExpectsThis);
+    instrument_.Cancel(nobodyExpectsThis);
     EXPECT_EQ(TransferStatus::Cancelled, nobodyExpectsThis.status);
     EXPECT_EQ(piece, ReadEeprom(7936, 256)) << "closing bytes are no data";
 }
@@ -89,7 +89,7 @@ TEST_F(SimulatedInstrumentTest, RefusesWhatItCannotDo) {
          }) {
         TestTransfer transfer = TestTransfer::Control(test.setup, test.data);
         transfer.setup.length = static_cast<std::uint16_t>(test.data.size());
-        EXPECT_EQ(Errors::Success, instrument.Submit(transfer)) << test.name;
+        EXPECT_EQ(Errors::Success, instrument_.Submit(transfer)) << test.name;
         EXPECT_EQ(TransferStatus::Stalled, transfer.status) << test.name;
         EXPECT_EQ(0U, transfer.actualLength) << test.name;
         EXPECT_EQ(1, transfer.completions) << test.name;
@@ -100,7 +100,7 @@ TEST_F(SimulatedInstrumentTest, RefusesWhatItCannotDo) {
 
 TEST_F(SimulatedInstrumentTest, ReadoutComesOnceAndThenNothing) {
     TestTransfer early = TestTransfer::In(BulkInEndpoint, 256);
-    instrument.Submit(early);
+    instrument_.Submit(early);
     EXPECT_EQ(0, early.completions) << "nothing was asked for yet";
     Do(TestTransfer::Vendor(Request::Measure));
     EXPECT_EQ(1, early.completions);
@@ -109,11 +109,11 @@ TEST_F(SimulatedInstrumentTest, ReadoutComesOnceAndThenNothing) {
     // It was taken whole, so an empty transfer tells the end; then the endpoint is silent.
     EXPECT_EQ(0U, Do(TestTransfer::In(BulkInEndpoint, 256)).size());
     TestTransfer late = TestTransfer::In(BulkInEndpoint, 256);
-    instrument.Submit(late);
+    instrument_.Submit(late);
     EXPECT_EQ(0, late.completions);
-    EXPECT_EQ(1U, instrument.PendingTransfers());
-    instrument.Cancel(late);
-    instrument.Cancel(late);
+    EXPECT_EQ(1U, instrument_.PendingTransfers());
+    instrument_.Cancel(late);
+    instrument_.Cancel(late);
     EXPECT_EQ(1, late.completions);
     EXPECT_EQ(TransferStatus::Cancelled, late.status);
 }
@@ -121,21 +121,21 @@ TEST_F(SimulatedInstrumentTest, ReadoutComesOnceAndThenNothing) {
 TEST_F(SimulatedInstrumentTest, NewRequestDropsWhatWasLeft) {
     Do(TestTransfer::Vendor(Request::Measure));
     Do(TestTransfer::In(BulkInEndpoint, 100));
-    const Bytes start = instrument.Eeprom();
+    const Bytes start = instrument_.Eeprom();
     EXPECT_EQ(Bytes(start.begin(), start.begin() + 64), ReadEeprom(0, 64));
     TestTransfer rest = TestTransfer::In(BulkInEndpoint, 64);
-    instrument.Submit(rest);
+    instrument_.Submit(rest);
     EXPECT_EQ(0, rest.completions) << "memory of a length that the host named has no end mark";
-    instrument.Cancel(rest);
+    instrument_.Cancel(rest);
 
     Do(TestTransfer::Vendor(Request::Measure));
     Do(TestTransfer::Memory(Request::WriteEeprom, 0, 2));
     Do(TestTransfer::Vendor(Request::Reset, {31}));
     for (const std::uint8_t endpoint : {BulkInEndpoint, BulkOutEndpoint}) {
         TestTransfer silent = TestTransfer::In(endpoint, 2);
-        instrument.Submit(silent);
+        instrument_.Submit(silent);
         EXPECT_EQ(0, silent.completions) << "a reset ends what was under way";
-        instrument.Cancel(silent);
+        instrument_.Cancel(silent);
     }
 }
 
@@ -160,7 +160,7 @@ TEST_F(SimulatedInstrumentTest, ScanEndsWithTheTransferThatIsNotFull) {
          }) {
         InstrumentSettings settings;
         settings.scanBytes = test.scanBytes;
-        SimulatedInstrument scanning(scheduler, settings);
+        SimulatedInstrument scanning(scheduler_, settings);
         TestTransfer measure = TestTransfer::Vendor(Request::Measure);
         scanning.Submit(measure);
         Bytes all;
@@ -184,62 +184,62 @@ TEST_F(SimulatedInstrumentTest, PacedDataComeInTime) {
     InstrumentSettings settings;
     settings.scanBytes = 4096;
     settings.bytesPerSecond = 1'000'000;
-    SimulatedInstrument paced(scheduler, settings);
+    SimulatedInstrument paced(scheduler_, settings);
     TestTransfer measure = TestTransfer::Vendor(Request::Measure);
     TestTransfer first = TestTransfer::In(BulkInEndpoint, 1024);
     TestTransfer second = TestTransfer::In(BulkInEndpoint, 2048);
     paced.Submit(measure);
     paced.Submit(first);
     paced.Submit(second);
-    scheduler.Advance(1023);
+    scheduler_.Advance(1023);
     EXPECT_EQ(0, first.completions);
-    scheduler.Advance(1);
+    scheduler_.Advance(1);
     EXPECT_EQ(1, first.completions);
 
     // Cancelled half way: the packets that had come are in, and the rest follows with the next transfer.
-    scheduler.Advance(1100);
+    scheduler_.Advance(1100);
     paced.Cancel(second);
     EXPECT_EQ(TransferStatus::Cancelled, second.status);
     EXPECT_EQ(1024U, second.actualLength);
     TestTransfer third = TestTransfer::In(BulkInEndpoint, 4096);
     paced.Submit(third);
-    scheduler.Advance(2048);
+    scheduler_.Advance(2048);
     EXPECT_EQ(1, third.completions);
     EXPECT_EQ(2048U, third.actualLength);
     EXPECT_EQ(paced.WithCommands([](Commands& state) { return state.Answers().Expected(2048, 2048); }),
               third.Data());
-    EXPECT_EQ(0U, scheduler.Waiting());
+    EXPECT_EQ(0U, scheduler_.Waiting());
 }
 
 TEST_F(SimulatedInstrumentTest, MeasurementCanTakeItsTime) {
     InstrumentSettings settings;
     settings.takesIntegrationTime = true;
-    SimulatedInstrument slow(scheduler, settings);
+    SimulatedInstrument slow(scheduler_, settings);
     TestTransfer measure = TestTransfer::Vendor(Request::Measure);
     TestTransfer readout = TestTransfer::In(BulkInEndpoint, 256);
     slow.Submit(measure);
     slow.Submit(readout);
-    scheduler.Advance(294 * 68 - 1);
+    scheduler_.Advance(294 * 68 - 1);
     EXPECT_EQ(0, readout.completions);
-    scheduler.Advance(1);
+    scheduler_.Advance(1);
     EXPECT_EQ(1, readout.completions);
 }
 
 TEST_F(SimulatedInstrumentTest, ButtonReportWaitsForTheHost) {
     TestTransfer first = TestTransfer::In(InterruptInEndpoint, 8);
-    instrument.Submit(first);
+    instrument_.Submit(first);
     EXPECT_EQ(0, first.completions);
-    instrument.PressButton();
+    instrument_.PressButton();
     EXPECT_EQ(1, first.completions);
     EXPECT_EQ(1U, first.actualLength);
 
-    instrument.PressButton();
-    instrument.PressButton();
+    instrument_.PressButton();
+    instrument_.PressButton();
     EXPECT_EQ(1U, Do(TestTransfer::In(InterruptInEndpoint, 1)).size());
     TestTransfer third = TestTransfer::In(InterruptInEndpoint, 1);
-    instrument.Submit(third);
+    instrument_.Submit(third);
     EXPECT_EQ(0, third.completions) << "two presses that nobody fetched make one report";
-    instrument.Cancel(third);
+    instrument_.Cancel(third);
 }
 
 TEST_F(SimulatedInstrumentTest, HaltedEndpointStallsUntilCleared) {
@@ -248,15 +248,15 @@ TEST_F(SimulatedInstrumentTest, HaltedEndpointStallsUntilCleared) {
     };
     for (const bool byRequest : {true, false}) {
         TestTransfer pending = TestTransfer::In(BulkInEndpoint, 64);
-        instrument.Submit(pending);
-        instrument.HaltEndpoint(BulkInEndpoint);
+        instrument_.Submit(pending);
+        instrument_.HaltEndpoint(BulkInEndpoint);
         EXPECT_EQ(TransferStatus::Stalled, pending.status);
         EXPECT_EQ(TransferStatus::Stalled, StatusOf(TestTransfer::In(BulkInEndpoint, 64)));
         EXPECT_TRUE(isHalted());
         if (byRequest) {
             Do(TestTransfer::Control({0x02, 1, 0, BulkInEndpoint, 0}, {}));
         } else {
-            EXPECT_EQ(Errors::Success, instrument.ClearHalt(BulkInEndpoint));
+            EXPECT_EQ(Errors::Success, instrument_.ClearHalt(BulkInEndpoint));
         }
         EXPECT_FALSE(isHalted());
         EXPECT_EQ(64U, ReadEeprom(0, 64).size());
@@ -283,27 +283,27 @@ TEST_F(SimulatedInstrumentTest, DescriptorsAreWhatAnOperatingSystemExpects) {
 }
 
 TEST_F(SimulatedInstrumentTest, UnplugEndsEverythingAndLosesWhatIsVolatile) {
-    ASSERT_EQ(Errors::Success, instrument.Claim());
+    ASSERT_EQ(Errors::Success, instrument_.Claim());
     Do(TestTransfer::Vendor(Request::SetMeasureParameters, Bytes(8, 9)));
     Do(TestTransfer::Memory(Request::WriteEeprom, 100, 1));
     Do(TestTransfer::Out(BulkOutEndpoint, {42}));
     TestTransfer bulk = TestTransfer::In(BulkInEndpoint, 64);
     TestTransfer interrupt = TestTransfer::In(InterruptInEndpoint, 1);
-    instrument.Submit(bulk);
-    instrument.Submit(interrupt);
-    instrument.Unplug();
+    instrument_.Submit(bulk);
+    instrument_.Submit(interrupt);
+    instrument_.Unplug();
     for (const TestTransfer* transfer : {&bulk, &interrupt}) {
         EXPECT_EQ(1, transfer->completions);
         EXPECT_EQ(TransferStatus::DeviceGone, transfer->status);
     }
     TestTransfer after = TestTransfer::In(BulkInEndpoint, 64);
-    EXPECT_EQ(Errors::DeviceNotConnected, instrument.Submit(after));
-    EXPECT_EQ(Errors::DeviceNotConnected, instrument.Claim());
+    EXPECT_EQ(Errors::DeviceNotConnected, instrument_.Submit(after));
+    EXPECT_EQ(Errors::DeviceNotConnected, instrument_.Claim());
     EXPECT_EQ(0, after.completions);
 
-    instrument.PlugIn();
-    EXPECT_EQ(Errors::Success, instrument.Claim());
-    instrument.WithCommands([](const Commands& state) {
+    instrument_.PlugIn();
+    EXPECT_EQ(Errors::Success, instrument_.Claim());
+    instrument_.WithCommands([](const Commands& state) {
         EXPECT_EQ(MeasureParameters(), state.parameters);
         EXPECT_EQ(42, state.eeprom[100]);
     });

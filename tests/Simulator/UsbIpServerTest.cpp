@@ -76,23 +76,23 @@ class UsbIpServerTest : public testing::Test {
         return {};
     }
 
-    const std::string name = ServerThread::UniqueName("a");
-    ServerThread server;
+    const std::string name_ = ServerThread::UniqueName("a");
+    ServerThread server_;
 };
 
 TEST_F(UsbIpServerTest, InstrumentsAreListedByNameForAsLongAsTheyAreThere) {
     const std::string other = ServerThread::UniqueName("b");
-    EXPECT_FALSE(Listed(name));
-    server.Add(other);
-    server.Add(name);
+    EXPECT_FALSE(Listed(name_));
+    server_.Add(other);
+    server_.Add(name_);
     std::vector<std::string> names = Platform::Usb::SystemUsbBus().List();
     std::erase_if(names, [&](const std::string& each) {
-        return each != "simulated-" + name && each != "simulated-" + other;
+        return each != "simulated-" + name_ && each != "simulated-" + other;
     });
-    EXPECT_EQ((std::vector<std::string>{"simulated-" + name, "simulated-" + other}), names);
-    EXPECT_THROW(server.Add(name), std::runtime_error);
-    EXPECT_THROW(server.Add("a/b"), std::runtime_error);
-    const SimulatorInfo info = Describe(name);
+    EXPECT_EQ((std::vector<std::string>{"simulated-" + name_, "simulated-" + other}), names);
+    EXPECT_THROW(server_.Add(name_), std::runtime_error);
+    EXPECT_THROW(server_.Add("a/b"), std::runtime_error);
+    const SimulatorInfo info = Describe(name_);
     EXPECT_TRUE(info.usable);
     EXPECT_EQ(getpid(), info.processId);
     EXPECT_EQ(geteuid(), info.userId);
@@ -105,8 +105,8 @@ TEST_F(UsbIpServerTest, InstrumentsAreListedByNameForAsLongAsTheyAreThere) {
 }
 
 TEST_F(UsbIpServerTest, MemoryTravelsBothWays) {
-    const auto instrument = server.Add(name);
-    const auto device = Open(name);
+    const auto instrument = server_.Add(name_);
+    const auto device = Open(name_);
     Platform::ErrorCode error = Errors::Busy;
     const auto endpoints = device->Endpoints(error);
     EXPECT_EQ(Errors::Success, error);
@@ -128,8 +128,8 @@ TEST_F(UsbIpServerTest, ScanWithTwoTransfersInFlightIsComplete) {
     constexpr std::uint64_t total = 3 * 1024 * 1024 + 1000;
     InstrumentSettings settings;
     settings.scanBytes = total;
-    const auto instrument = server.Add(name, settings);
-    const auto device = OpenAndClaim(name);
+    const auto instrument = server_.Add(name_, settings);
+    const auto device = OpenAndClaim(name_);
     Do(*device, TestTransfer::Vendor(Request::Measure, {}));
     Bytes all;
     auto current = std::unique_ptr<TestTransfer>(new TestTransfer(TestTransfer::In(BulkInEndpoint, piece)));
@@ -148,7 +148,7 @@ TEST_F(UsbIpServerTest, ScanWithTwoTransfersInFlightIsComplete) {
             break;
         }
     }
-    server.Do([&] {
+    server_.Do([&] {
         EXPECT_EQ(
             instrument->WithCommands([](Commands& state) { return state.Answers().Expected(0, total); }),
             all);
@@ -156,24 +156,24 @@ TEST_F(UsbIpServerTest, ScanWithTwoTransfersInFlightIsComplete) {
 }
 
 TEST_F(UsbIpServerTest, OneProgramAtATime) {
-    const auto instrument = server.Add(name);
-    const auto first = OpenAndClaim(name);
-    const auto second = Open(name);
+    const auto instrument = server_.Add(name_);
+    const auto first = OpenAndClaim(name_);
+    const auto second = Open(name_);
     EXPECT_EQ(Errors::Busy, second->Claim());
-    EXPECT_NE(std::string::npos, Describe(name).usedBy.find("process " + std::to_string(getpid())))
-        << Describe(name).usedBy;
+    EXPECT_NE(std::string::npos, Describe(name_).usedBy.find("process " + std::to_string(getpid())))
+        << Describe(name_).usedBy;
     first->Release();
     EXPECT_EQ(Errors::Success, second->Claim()) << "free as soon as it is released";
     second->Release();
-    EXPECT_EQ("", Describe(name).usedBy);
+    EXPECT_EQ("", Describe(name_).usedBy);
 }
 
 TEST_F(UsbIpServerTest, FaultsCrossTheConnection) {
-    server.Add(name, {},
-               "bulk-in 0:io-error; bulk-in 1:overflow; bulk-in 2:stall; bulk-in 4:late-cancel; control "
-               "3:gone-before");
+    server_.Add(name_, {},
+                "bulk-in 0:io-error; bulk-in 1:overflow; bulk-in 2:stall; bulk-in 4:late-cancel; control "
+                "3:gone-before");
     for (int round = 0; round < 2; ++round) {
-        const auto device = OpenAndClaim(name);
+        const auto device = OpenAndClaim(name_);
         for (const auto status :
              {TransferStatus::IoError, TransferStatus::Overflow, TransferStatus::Stalled}) {
             TestTransfer failing = TestTransfer::In(BulkInEndpoint, 64);
@@ -206,11 +206,11 @@ TEST_F(UsbIpServerTest, SlowPeerDoesNotHoldUpTheOthers) {
     const std::string other = ServerThread::UniqueName("b");
     InstrumentSettings endless;
     endless.scanBytes = std::uint64_t{1} << 40;
-    server.Add(name, endless);
-    server.Add(other);
+    server_.Add(name_, endless);
+    server_.Add(other);
 
     // Asks for a gigabyte and reads none of it.
-    const int lazy = Platform::Usb::ConnectToSimulator(name);
+    const int lazy = Platform::Usb::ConnectToSimulator(name_);
     ASSERT_GE(lazy, 0);
     const auto send = [lazy](const auto& bytes) {
         return ::send(lazy, bytes.data(), bytes.size(), MSG_DONTWAIT | MSG_NOSIGNAL) ==
@@ -239,14 +239,14 @@ TEST_F(UsbIpServerTest, SlowPeerDoesNotHoldUpTheOthers) {
 }
 
 TEST_F(UsbIpServerTest, PeersWithOddMannersDoNoHarm) {
-    const auto instrument = server.Add(name);
+    const auto instrument = server_.Add(name_);
     const auto countFiles = [] {
         return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
     };
     const auto before = countFiles();
     std::mt19937 random(3);
     for (int round = 0; round < 200; ++round) {
-        const int file = Platform::Usb::ConnectToSimulator(name);
+        const int file = Platform::Usb::ConnectToSimulator(name_);
         ASSERT_GE(file, 0);
         Bytes bytes(random() % 400);
         for (std::uint8_t& byte : bytes) {
@@ -266,7 +266,7 @@ TEST_F(UsbIpServerTest, PeersWithOddMannersDoNoHarm) {
         close(file);
     }
     Platform::ErrorCode code = Errors::Busy;
-    const auto device = Open(name);
+    const auto device = Open(name_);
     for (int i = 0; i < 1000 && code == Errors::Busy; ++i) {
         usleep(1000);
         code = device->Claim();
@@ -281,7 +281,7 @@ TEST_F(UsbIpServerTest, PeersWithOddMannersDoNoHarm) {
 }
 
 TEST_F(UsbIpServerTest, PeerThatStopsWhereItIsDueIsGivenUp) {
-    const auto instrument = server.Add(name);
+    const auto instrument = server_.Add(name_);
     const auto operation =
         UsbIp::Encode(UsbIp::OperationHeader{UsbIp::ProtocolVersion, UsbIp::Operation::ImportRequest, {}});
     const auto busId = UsbIp::EncodeBusId(Platform::Usb::SimulatorBusId);
@@ -310,7 +310,7 @@ TEST_F(UsbIpServerTest, PeerThatStopsWhereItIsDueIsGivenUp) {
              Case{"before a payload", imported(48), false},
              Case{"after an import", imported(0), true},
          }) {
-        const int file = Platform::Usb::ConnectToSimulator(name);
+        const int file = Platform::Usb::ConnectToSimulator(name_);
         ASSERT_GE(file, 0);
         const auto isOpen = [&] {
             Bytes bytes(1000);
@@ -323,21 +323,21 @@ TEST_F(UsbIpServerTest, PeerThatStopsWhereItIsDueIsGivenUp) {
         };
         send(file, test.sent.data(), test.sent.size(), MSG_NOSIGNAL);
         EXPECT_TRUE(isOpen()) << test.name;
-        server.Advance(4'000'000);
+        server_.Advance(4'000'000);
         EXPECT_TRUE(isOpen()) << test.name;
-        server.Advance(2'000'000);
+        server_.Advance(2'000'000);
         EXPECT_EQ(test.mayStay, isOpen()) << test.name;
         close(file);
-        server.Advance(0);
+        server_.Advance(0);
     }
 }
 
 TEST_F(UsbIpServerTest, TcpOffersAllOfThem) {
     const std::string other = ServerThread::UniqueName("b");
-    server.Add(name);
-    server.Add(other);
+    server_.Add(name_);
+    server_.Add(other);
     std::uint16_t port = 0;
-    server.Do([&] { port = server.Server().ListenTcp(0); });
+    server_.Do([&] { port = server_.Server().ListenTcp(0); });
     const Platform::Usb::UsbIpConnector connect = [port](Platform::ErrorCode&) {
         const int file = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
         sockaddr_in address{};
@@ -359,22 +359,22 @@ TEST_F(UsbIpServerTest, TcpOffersAllOfThem) {
     EXPECT_EQ(Errors::Success, overTcp->Claim());
     Do(*overTcp, TestTransfer::Vendor(Request::Reset, {31}));
     EXPECT_EQ(Errors::Busy, Open(other)->Claim()) << "one import, whichever way it came";
-    EXPECT_EQ(Errors::Success, Open(name)->Claim());
+    EXPECT_EQ(Errors::Success, Open(name_)->Claim());
     EXPECT_EQ(Errors::DeviceNotConnected, Platform::Usb::MakeUsbIpDevice(connect, "1-3")->Claim());
 }
 
 TEST_F(UsbIpServerTest, StoppedSimulatorHoldsUpNobody) {
-    const int listener = Platform::Usb::ListenAsSimulator(name);
+    const int listener = Platform::Usb::ListenAsSimulator(name_);
     ASSERT_GE(listener, 0);
-    SimulatorInfo info = Describe(name);
+    SimulatorInfo info = Describe(name_);
     EXPECT_TRUE(info.usable);
     EXPECT_FALSE(info.answers);
     for (int i = 0, file = 0; i < 1000 && file >= 0; ++i) {
-        file = Platform::Usb::ConnectToSimulator(name);
+        file = Platform::Usb::ConnectToSimulator(name_);
         close(file);
     }
-    EXPECT_FALSE(Listed(name)) << "it takes no more connections";
-    info = Describe(name);
+    EXPECT_FALSE(Listed(name_)) << "it takes no more connections";
+    info = Describe(name_);
     EXPECT_FALSE(info.usable);
     EXPECT_FALSE(info.answers);
     close(listener);
@@ -383,16 +383,16 @@ TEST_F(UsbIpServerTest, StoppedSimulatorHoldsUpNobody) {
 TEST_F(UsbIpServerTest, ListingTroublesASimulatorOnce) {
     for (const char* const each : {"the first", "the one in its place"}) {
         SCOPED_TRACE(each);
-        const int listener = Platform::Usb::ListenAsSimulator(name);
+        const int listener = Platform::Usb::ListenAsSimulator(name_);
         ASSERT_GE(listener, 0);
-        EXPECT_TRUE(Listed(name) && Listed(name) && Listed(name));
+        EXPECT_TRUE(Listed(name_) && Listed(name_) && Listed(name_));
         int connections = 0;
         for (int file = 0; (file = accept(listener, nullptr, nullptr)) >= 0; ++connections) {
             close(file);
         }
         EXPECT_EQ(1, connections);
         close(listener);
-        EXPECT_FALSE(Listed(name));
+        EXPECT_FALSE(Listed(name_));
     }
 }
 
@@ -405,7 +405,7 @@ TEST_F(UsbIpServerTest, AnotherUsersSimulatorIsSeenAndNotUsed) {
     ASSERT_EQ(0, pipe(ready));
     const pid_t child = fork();
     if (child == 0) {
-        const bool listening = setuid(nobody) == 0 && Platform::Usb::ListenAsSimulator(name) >= 0;
+        const bool listening = setuid(nobody) == 0 && Platform::Usb::ListenAsSimulator(name_) >= 0;
         const char answer = listening ? 'y' : 'n';
         const bool told = write(ready[1], &answer, 1) == 1;
         pause();
@@ -414,13 +414,13 @@ TEST_F(UsbIpServerTest, AnotherUsersSimulatorIsSeenAndNotUsed) {
     char answer = 'n';
     ASSERT_EQ(1, read(ready[0], &answer, 1));
     ASSERT_EQ('y', answer);
-    EXPECT_FALSE(Listed(name));
-    const SimulatorInfo info = Describe(name);
+    EXPECT_FALSE(Listed(name_));
+    const SimulatorInfo info = Describe(name_);
     EXPECT_FALSE(info.usable);
     EXPECT_EQ(nobody, info.userId);
     EXPECT_EQ(child, info.processId);
     Platform::ErrorCode error = Errors::Success;
-    EXPECT_EQ(nullptr, SimulatorBus().Open("simulated-" + name, error));
+    EXPECT_EQ(nullptr, SimulatorBus().Open("simulated-" + name_, error));
     EXPECT_EQ(Errors::AccessDenied, error);
     kill(child, SIGKILL);
     waitpid(child, nullptr, 0);

@@ -55,7 +55,7 @@ class Peer final {
     std::uint32_t Submit(std::uint8_t endpoint, std::uint32_t length, const SetupPacket& setup,
                          const Bytes& out = {}) {
         UsbIp::SubmitPacket packet;
-        packet.sequence = ++sequence;
+        packet.sequence = ++sequence_;
         packet.endpoint = endpoint;
         packet.in = endpoint == 0 ? setup.IsIn() : (endpoint & 0x80) != 0;
         packet.length = length;
@@ -63,7 +63,7 @@ class Peer final {
         const UsbIp::PacketBytes header = UsbIp::Encode(packet);
         Send({header.begin(), header.end()});
         Send(out);
-        return sequence;
+        return sequence_;
     }
     std::uint32_t In(std::uint8_t endpoint, std::uint32_t length) { return Submit(endpoint, length, {}); }
     std::uint32_t Vendor(Request request, const Bytes& data) {
@@ -72,15 +72,15 @@ class Peer final {
                       data);
     }
     std::uint32_t Unlink(std::uint32_t victim) {
-        const UsbIp::PacketBytes bytes = UsbIp::Encode(UsbIp::UnlinkPacket{++sequence, 0, victim});
+        const UsbIp::PacketBytes bytes = UsbIp::Encode(UsbIp::UnlinkPacket{++sequence_, 0, victim});
         Send({bytes.begin(), bytes.end()});
-        return sequence;
+        return sequence_;
     }
 
     std::unique_ptr<UsbIpSession> session;
 
   private:
-    std::uint32_t sequence = 0;
+    std::uint32_t sequence_ = 0;
 };
 
 Bytes SubmitReply(std::uint32_t sequence, std::int32_t status, const Bytes& data) {
@@ -98,17 +98,18 @@ Bytes UnlinkReply(std::uint32_t sequence, std::int32_t status) {
 class UsbIpSessionTest : public testing::Test {
   protected:
     std::shared_ptr<Platform::Usb::UsbDevice> Device(const std::string& faults = "") {
-        return InjectFaults(SimulatedInstrument::Connect(instrument),
-                            std::make_shared<FaultScript>(FaultPlan::Parse(faults)), scheduler);
+        return InjectFaults(SimulatedInstrument::Connect(instrument_),
+                            std::make_shared<FaultScript>(FaultPlan::Parse(faults)), scheduler_);
     }
 
-    ManualScheduler scheduler;
-    const std::shared_ptr<SimulatedInstrument> instrument = std::make_shared<SimulatedInstrument>(scheduler);
-    OneRecord exports;
+    ManualScheduler scheduler_;
+    const std::shared_ptr<SimulatedInstrument> instrument_ =
+        std::make_shared<SimulatedInstrument>(scheduler_);
+    OneRecord exports_;
 };
 
 TEST_F(UsbIpSessionTest, ListsAndThenEnds) {
-    Peer peer(exports);
+    Peer peer(exports_);
     peer.Send({0x01, 0x11, 0x80});
     EXPECT_TRUE(peer.Take().empty());
     peer.Send({0x05, 0, 0, 0, 0});
@@ -123,11 +124,11 @@ TEST_F(UsbIpSessionTest, ListsAndThenEnds) {
 
 TEST_F(UsbIpSessionTest, RefusedImportsAreAnsweredAndEndIt) {
     for (const std::string busId : {"1-1", "1-2"}) {
-        Peer peer(exports);
+        Peer peer(exports_);
         peer.Send({0x01, 0x11, 0x80, 0x03, 0, 0, 0, 0});
         const UsbIp::BusIdBytes id = UsbIp::EncodeBusId(busId);
         peer.Send({id.begin(), id.end()});
-        const auto status = static_cast<std::uint8_t>(exports.ImportDevice(busId).status);
+        const auto status = static_cast<std::uint8_t>(exports_.ImportDevice(busId).status);
         EXPECT_EQ((Bytes{0x01, 0x11, 0x00, 0x03, 0, 0, 0, status}), peer.Take());
         EXPECT_TRUE(peer.session->Over());
     }
@@ -161,7 +162,7 @@ TEST_F(UsbIpSessionTest, UnpluggingEndsTheSessionWithoutAnswers) {
     Peer peer(Device());
     peer.In(BulkInEndpoint, 64);
     peer.In(Protocol::InterruptInEndpoint, 1);
-    instrument->Unplug();
+    instrument_->Unplug();
     EXPECT_TRUE(peer.session->Over());
     EXPECT_TRUE(peer.Take().empty());
 
@@ -185,7 +186,7 @@ TEST_F(UsbIpSessionTest, RefusesPeersThatBreakTheProtocol) {
     for (const Bytes& operation :
          {Bytes{0x01, 0x10, 0x80, 0x05, 0, 0, 0, 0}, Bytes{0x01, 0x11, 0x80, 0x07, 0, 0, 0, 0},
           Bytes{'G', 'E', 'T', ' ', '/', ' ', 'H', 'T'}}) {
-        Peer peer(exports);
+        Peer peer(exports_);
         peer.Send(operation);
         EXPECT_TRUE(peer.session->Over());
         EXPECT_NE("", peer.session->Complaint());
@@ -209,7 +210,7 @@ TEST_F(UsbIpSessionTest, RefusesPeersThatBreakTheProtocol) {
     }
     EXPECT_TRUE(greedy.session->Over());
     greedy.session.reset();
-    EXPECT_EQ(0U, instrument->PendingTransfers());
+    EXPECT_EQ(0U, instrument_->PendingTransfers());
 }
 
 TEST_F(UsbIpSessionTest, PeerThatDoesNotReadIsNotServedFurther) {
@@ -229,7 +230,7 @@ TEST_F(UsbIpSessionTest, PeerThatDoesNotReadIsNotServedFurther) {
     // Nor are the rest of the packets that came together with the one that was too many.
     InstrumentSettings endless;
     endless.scanBytes = std::uint64_t{1} << 40;
-    Peer hungry(SimulatedInstrument::Connect(std::make_shared<SimulatedInstrument>(scheduler, endless)));
+    Peer hungry(SimulatedInstrument::Connect(std::make_shared<SimulatedInstrument>(scheduler_, endless)));
     hungry.Vendor(Request::Measure, {});
     hungry.Take();
     Bytes packets;

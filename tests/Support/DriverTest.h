@@ -30,11 +30,11 @@ class DriverTest : public testing::Test {
   protected:
     explicit DriverTest(TestTime time = TestTime::RealForThreadSanitizer,
                         std::vector<std::string> paths = {"native/1", "usbio/1"})
-        : clock(time), driver(std::move(paths)) {}
+        : clock_(time), driver_(std::move(paths)) {}
 
-    TestClock clock;  // before all that has to do with time
-    ScriptedDriver driver;
-    Platform::ScopedDeviceFiles files{driver};
+    TestClock clock_;  // before all that has to do with time
+    ScriptedDriver driver_;
+    Platform::ScopedDeviceFiles files_{driver_};
 };
 
 /// Lets other threads get on until `condition` holds; fails the test when that takes 20 seconds.
@@ -53,10 +53,10 @@ void WaitUntil(Condition condition) {
 /// Runs a function on a thread of the platform; waits for its end.
 class BackgroundThread final {
   public:
-    explicit BackgroundThread(std::function<void()> entry) : body(std::move(entry)) {
-        thread = Platform::OwnedHandle(Platform::StartThread(
+    explicit BackgroundThread(std::function<void()> entry) : body_(std::move(entry)) {
+        thread_ = Platform::OwnedHandle(Platform::StartThread(
             [](void* self) {
-                static_cast<BackgroundThread*>(self)->body();
+                static_cast<BackgroundThread*>(self)->body_();
                 return std::uint32_t{0};
             },
             this));
@@ -65,12 +65,12 @@ class BackgroundThread final {
     BackgroundThread(const BackgroundThread&) = delete;
     BackgroundThread& operator=(const BackgroundThread&) = delete;
 
-    void Join() { Platform::Wait(thread.Get(), Platform::Infinite); }
-    bool HasEnded() { return Platform::Wait(thread.Get(), 0) == Platform::WaitResult::Signalled; }
+    void Join() { Platform::Wait(thread_.Get(), Platform::Infinite); }
+    bool HasEnded() { return Platform::Wait(thread_.Get(), 0) == Platform::WaitResult::Signalled; }
 
   private:
-    const std::function<void()> body;
-    Platform::OwnedHandle thread;
+    const std::function<void()> body_;
+    Platform::OwnedHandle thread_;
 };
 
 /// Notes messages; does what the test wants inside them.
@@ -78,23 +78,23 @@ class RecordingListener final : public DeviceDriver::Generic::EventListener {
   public:
     void MessageFromDevice(std::uint32_t code, std::uint32_t parameter) override {
         {
-            const std::lock_guard held(lock);
-            codes.push_back(code + parameter);
+            const std::lock_guard held(lock_);
+            codes_.push_back(code + parameter);
         }
         if (onMessage) {
             onMessage(code);
         }
     }
     std::vector<std::uint32_t> Codes() {
-        const std::lock_guard held(lock);
-        return codes;
+        const std::lock_guard held(lock_);
+        return codes_;
     }
 
     std::function<void(std::uint32_t code)> onMessage;
 
   private:
-    std::mutex lock;
-    std::vector<std::uint32_t> codes;
+    std::mutex lock_;
+    std::vector<std::uint32_t> codes_;
 };
 
 }  // namespace Varnholt::Tests

@@ -23,7 +23,7 @@ class HelperProcess final {
 
   private:
     struct Impl;
-    const std::unique_ptr<Impl> impl;
+    const std::unique_ptr<Impl> impl_;
 };
 
 struct Helper {

@@ -13,7 +13,7 @@ struct HelperProcess::Impl {
 };
 
 HelperProcess::HelperProcess(const std::string& helper, const std::vector<std::string>& arguments)
-    : impl(std::make_unique<Impl>()) {
+    : impl_(std::make_unique<Impl>()) {
     std::vector<std::string> texts{"helper", "--helper", helper};
     texts.insert(texts.end(), arguments.begin(), arguments.end());
     std::vector<char*> pointers;
@@ -21,8 +21,8 @@ HelperProcess::HelperProcess(const std::string& helper, const std::vector<std::s
         pointers.push_back(text.data());
     }
     pointers.push_back(nullptr);
-    if (posix_spawn(&impl->process, "/proc/self/exe", nullptr, nullptr, pointers.data(), environ) != 0) {
-        impl->process = -1;
+    if (posix_spawn(&impl_->process, "/proc/self/exe", nullptr, nullptr, pointers.data(), environ) != 0) {
+        impl_->process = -1;
     }
 }
 
@@ -32,16 +32,16 @@ HelperProcess::~HelperProcess() {
 
 int HelperProcess::WaitForExit() {
     int status = 0;
-    if (impl->process <= 0 || waitpid(impl->process, &status, 0) != impl->process) {
+    if (impl_->process <= 0 || waitpid(impl_->process, &status, 0) != impl_->process) {
         return -1;
     }
-    impl->process = -1;
+    impl_->process = -1;
     return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 
 void HelperProcess::Kill() {
-    if (impl->process > 0) {
-        kill(impl->process, SIGKILL);
+    if (impl_->process > 0) {
+        kill(impl_->process, SIGKILL);
         WaitForExit();
     }
 }

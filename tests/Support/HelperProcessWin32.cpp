@@ -9,7 +9,7 @@ struct HelperProcess::Impl {
 };
 
 HelperProcess::HelperProcess(const std::string& helper, const std::vector<std::string>& arguments)
-    : impl(std::make_unique<Impl>()) {
+    : impl_(std::make_unique<Impl>()) {
     char program[MAX_PATH] = {};
     GetModuleFileNameA(nullptr, program, MAX_PATH - 1);
     std::string command = "\"" + std::string(program) + "\" --helper " + helper;
@@ -22,7 +22,7 @@ HelperProcess::HelperProcess(const std::string& helper, const std::vector<std::s
     if (CreateProcessA(program, command.data(), nullptr, nullptr, FALSE, 0, nullptr, nullptr, &startup,
                        &started)) {
         CloseHandle(started.hThread);
-        impl->process = started.hProcess;
+        impl_->process = started.hProcess;
     }
 }
 
@@ -31,20 +31,20 @@ HelperProcess::~HelperProcess() {
 }
 
 int HelperProcess::WaitForExit() {
-    if (!impl->process) {
+    if (!impl_->process) {
         return -1;
     }
-    WaitForSingleObject(impl->process, INFINITE);
+    WaitForSingleObject(impl_->process, INFINITE);
     DWORD code = 0;
-    GetExitCodeProcess(impl->process, &code);
-    CloseHandle(impl->process);
-    impl->process = nullptr;
+    GetExitCodeProcess(impl_->process, &code);
+    CloseHandle(impl_->process);
+    impl_->process = nullptr;
     return static_cast<int>(code);
 }
 
 void HelperProcess::Kill() {
-    if (impl->process) {
-        TerminateProcess(impl->process, static_cast<UINT>(-1));
+    if (impl_->process) {
+        TerminateProcess(impl_->process, static_cast<UINT>(-1));
         WaitForExit();
     }
 }

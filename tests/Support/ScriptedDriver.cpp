@@ -56,36 +56,36 @@ Answer UsualAnswer(std::uint32_t code, std::uint32_t room) {
 
 }  // namespace
 
-ScriptedDriver::ScriptedDriver(std::vector<std::string> devicePaths) : paths(std::move(devicePaths)) {}
+ScriptedDriver::ScriptedDriver(std::vector<std::string> devicePaths) : paths_(std::move(devicePaths)) {}
 
 ScriptedDriver::~ScriptedDriver() {
-    for (const EventScheduler::EventId event : events) {
+    for (const EventScheduler::EventId event : events_) {
         ClockScheduler().Forget(event);
     }
 }
 
 void ScriptedDriver::Script(std::uint32_t place, Answer answer) {
-    const std::lock_guard held(lock);
-    scripts[place].push_back(std::move(answer));
+    const std::lock_guard held(lock_);
+    scripts_[place].push_back(std::move(answer));
 }
 
 void ScriptedDriver::DropScript(std::uint32_t place) {
-    const std::lock_guard held(lock);
-    scripts[place].clear();
+    const std::lock_guard held(lock_);
+    scripts_[place].clear();
 }
 
 void ScriptedDriver::OnOpen(const std::string& path, std::function<ErrorCode()> action) {
-    const std::lock_guard held(lock);
-    openActions[path] = std::move(action);
+    const std::lock_guard held(lock_);
+    openActions_[path] = std::move(action);
 }
 
 bool ScriptedDriver::CompleteAs(std::uint32_t place, const Answer* answer) {
     std::uint64_t number = 0;
     ErrorCode code = Errors::Success;
     {
-        const std::lock_guard held(lock);
-        const auto oldest = std::ranges::find(running, place, &Transfer::place);
-        if (oldest == running.end()) {
+        const std::lock_guard held(lock_);
+        const auto oldest = std::ranges::find(running_, place, &Transfer::place);
+        if (oldest == running_.end()) {
             return false;
         }
         if (answer) {
@@ -99,8 +99,8 @@ bool ScriptedDriver::CompleteAs(std::uint32_t place, const Answer* answer) {
 }
 
 std::vector<std::string> ScriptedDriver::TakeTranscript() {
-    const std::lock_guard held(lock);
-    return std::exchange(transcript, {});
+    const std::lock_guard held(lock_);
+    return std::exchange(transcript_, {});
 }
 
 std::vector<std::string> ScriptedDriver::TakeTransfers() {
@@ -111,35 +111,35 @@ std::vector<std::string> ScriptedDriver::TakeTransfers() {
 }
 
 std::size_t ScriptedDriver::OpenFiles() const {
-    const std::lock_guard held(lock);
+    const std::lock_guard held(lock_);
     return static_cast<std::size_t>(
-        std::ranges::count_if(files, [](const auto& file) { return file->isOpen; }));
+        std::ranges::count_if(files_, [](const auto& file) { return file->isOpen; }));
 }
 
 std::size_t ScriptedDriver::RunningTransfers() const {
-    const std::lock_guard held(lock);
-    return running.size();
+    const std::lock_guard held(lock_);
+    return running_.size();
 }
 
 std::size_t ScriptedDriver::Running(std::uint32_t place) const {
-    const std::lock_guard held(lock);
-    return static_cast<std::size_t>(std::ranges::count(running, place, &Transfer::place));
+    const std::lock_guard held(lock_);
+    return static_cast<std::size_t>(std::ranges::count(running_, place, &Transfer::place));
 }
 
 std::uint64_t ScriptedDriver::BytesIn(std::uint32_t place) const {
-    const std::lock_guard held(lock);
-    const auto found = bytesIn.find(place);
-    return found == bytesIn.end() ? 0 : found->second;
+    const std::lock_guard held(lock_);
+    const auto found = bytesIn_.find(place);
+    return found == bytesIn_.end() ? 0 : found->second;
 }
 
 std::size_t ScriptedDriver::MostControlsAtOnce() const {
-    const std::lock_guard held(lock);
-    return mostControls;
+    const std::lock_guard held(lock_);
+    return mostControls_;
 }
 
 std::vector<std::string> ScriptedDriver::ListInterfaces(const Protocol::Guid& interfaceClass) {
     std::vector<std::string> listed;
-    std::ranges::copy_if(paths, std::back_inserter(listed), [&](const std::string& path) {
+    std::ranges::copy_if(paths_, std::back_inserter(listed), [&](const std::string& path) {
         return interfaceClass == (IsNative(path) ? Protocol::NativeDriver::InterfaceClass
                                                  : Protocol::UsbIoDriver::InterfaceClass);
     });
@@ -149,8 +149,8 @@ std::vector<std::string> ScriptedDriver::ListInterfaces(const Protocol::Guid& in
 Handle ScriptedDriver::Open(const std::string& path) {
     std::function<ErrorCode()> action;
     {
-        const std::lock_guard held(lock);
-        if (const auto found = openActions.find(path); found != openActions.end()) {
+        const std::lock_guard held(lock_);
+        if (const auto found = openActions_.find(path); found != openActions_.end()) {
             action = found->second;
         }
     }
@@ -158,16 +158,16 @@ Handle ScriptedDriver::Open(const std::string& path) {
         SetLastError(refusal);
         return InvalidHandle();
     }
-    const std::lock_guard held(lock);
-    transcript.push_back("open " + path);
-    files.push_back(std::make_unique<File>(File{path, PipeOf(path)}));
-    return files.back().get();
+    const std::lock_guard held(lock_);
+    transcript_.push_back("open " + path);
+    files_.push_back(std::make_unique<File>(File{path, PipeOf(path)}));
+    return files_.back().get();
 }
 
 ScriptedDriver::File* ScriptedDriver::Find(Handle handle) {
     {
-        const std::lock_guard held(lock);
-        for (const std::unique_ptr<File>& file : files) {
+        const std::lock_guard held(lock_);
+        for (const std::unique_ptr<File>& file : files_) {
             if (file.get() == handle && file->isOpen) {
                 return file.get();
             }
@@ -183,9 +183,9 @@ bool ScriptedDriver::CloseFile(Handle handle) {
         return false;
     }
     {
-        const std::lock_guard held(lock);
+        const std::lock_guard held(lock_);
         file->isOpen = false;
-        transcript.push_back("close " + file->path);
+        transcript_.push_back("close " + file->path);
     }
     EndAll(*file);
     return true;
@@ -229,9 +229,9 @@ bool ScriptedDriver::StartControl(Handle handle, std::uint32_t code, const void*
 }
 
 Answer ScriptedDriver::TakeAnswer(std::uint32_t place, std::uint32_t code, const Answer& usual) {
-    const std::lock_guard held(lock);
+    const std::lock_guard held(lock_);
     for (const std::uint32_t key : {code == 0 ? place : code, place}) {
-        if (std::deque<Answer>& script = scripts[key]; !script.empty()) {
+        if (std::deque<Answer>& script = scripts_[key]; !script.empty()) {
             Answer answer = std::move(script.front());
             script.pop_front();
             return answer;
@@ -244,8 +244,8 @@ bool ScriptedDriver::Start(const File& file, std::uint32_t code, std::string lin
                            std::uint32_t length, const Answer& usual, Overlapped& record) {
     const std::uint32_t place = code == 0 ? file.place : 0;
     {
-        const std::lock_guard held(lock);
-        transcript.push_back(std::move(line));
+        const std::lock_guard held(lock_);
+        transcript_.push_back(std::move(line));
     }
     const Answer answer = TakeAnswer(place, code, usual);
     if (answer.onStart) {
@@ -261,14 +261,14 @@ bool ScriptedDriver::Start(const File& file, std::uint32_t code, std::string lin
     }
     std::uint64_t number = 0;
     {
-        const std::lock_guard held(lock);
-        number = ++lastNumber;
+        const std::lock_guard held(lock_);
+        number = ++lastNumber_;
         record.internal = RunningMark;
         record.internalHigh = 0;
-        running.push_back(
+        running_.push_back(
             {number, &file, place, &record, target, length, std::this_thread::get_id(), answer});
-        mostControls = std::max(mostControls,
-                                static_cast<std::size_t>(std::ranges::count(running, 0U, &Transfer::place)));
+        mostControls_ = std::max(
+            mostControls_, static_cast<std::size_t>(std::ranges::count(running_, 0U, &Transfer::place)));
     }
     if (answer.after == 0) {
         End(number, answer.code, true);
@@ -285,29 +285,29 @@ void ScriptedDriver::EndLater(std::uint64_t number, std::uint64_t microseconds, 
     const EventScheduler::EventId event =
         ClockScheduler().CallAt(ClockScheduler().Now() + microseconds,
                                 [this, number, code, withData] { End(number, code, withData); });
-    const std::lock_guard held(lock);
-    events.push_back(event);
+    const std::lock_guard held(lock_);
+    events_.push_back(event);
 }
 
 void ScriptedDriver::End(std::uint64_t number, ErrorCode code, bool withData) {
     Handle event = NoHandle;
     {
-        const std::lock_guard held(lock);
-        const auto found = std::ranges::find(running, number, &Transfer::number);
-        if (found == running.end()) {
+        const std::lock_guard held(lock_);
+        const auto found = std::ranges::find(running_, number, &Transfer::number);
+        if (found == running_.end()) {
             return;
         }
         std::size_t moved = withData ? found->length : 0;
         if (found->target) {
             moved = std::min(moved, found->answer.data.size());
             std::copy_n(found->answer.data.begin(), moved, found->target);
-            bytesIn[found->place] += moved;
+            bytesIn_[found->place] += moved;
         }
         found->record->internalHigh = found->answer.count.value_or(static_cast<std::uint32_t>(moved));
         found->record->offset = code;
         found->record->internal = EndedMark;
         event = found->record->event;
-        running.erase(found);
+        running_.erase(found);
     }
     SignalEvent(event);
 }
@@ -315,8 +315,8 @@ void ScriptedDriver::End(std::uint64_t number, ErrorCode code, bool withData) {
 void ScriptedDriver::EndAll(const File& file) {
     std::vector<std::uint64_t> numbers;
     {
-        const std::lock_guard held(lock);
-        for (const Transfer& transfer : running) {
+        const std::lock_guard held(lock_);
+        for (const Transfer& transfer : running_) {
             if (transfer.file == &file) {
                 numbers.push_back(transfer.number);
             }
@@ -330,7 +330,7 @@ void ScriptedDriver::EndAll(const File& file) {
 bool ScriptedDriver::GetResult(Handle, Overlapped& record, std::uint32_t& transferred, bool wait) {
     for (;;) {
         {
-            const std::lock_guard held(lock);
+            const std::lock_guard held(lock_);
             if (record.internal != RunningMark) {
                 const bool hasEnded = record.internal == EndedMark;  // and not: was never started
                 transferred = static_cast<std::uint32_t>(record.internalHigh);
@@ -350,15 +350,15 @@ bool ScriptedDriver::GetResult(Handle, Overlapped& record, std::uint32_t& transf
 bool ScriptedDriver::CancelTransfers(Handle handle) {
     std::vector<Transfer> cancelled;
     {
-        const std::lock_guard held(lock);
-        for (Transfer& transfer : running) {
+        const std::lock_guard held(lock_);
+        for (Transfer& transfer : running_) {
             if (transfer.file == handle && transfer.starter == std::this_thread::get_id() &&
                 !std::exchange(transfer.isCancelled, true)) {
                 cancelled.push_back(transfer);
             }
         }
         if (!cancelled.empty()) {
-            transcript.push_back(Line("cancel", cancelled.front().place));
+            transcript_.push_back(Line("cancel", cancelled.front().place));
         }
     }
     for (const Transfer& transfer : cancelled) {

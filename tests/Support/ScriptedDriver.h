@@ -119,17 +119,17 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     void EndLater(std::uint64_t number, std::uint64_t microseconds, Platform::ErrorCode code, bool withData);
     void EndAll(const File& file);
 
-    const std::vector<std::string> paths;
-    mutable std::mutex lock;  ///< guards what follows
-    std::deque<std::unique_ptr<File>> files;
-    std::deque<Transfer> running;
-    std::map<std::uint32_t, std::deque<Answer>> scripts;
-    std::map<std::string, std::function<Platform::ErrorCode()>> openActions;
-    std::vector<std::string> transcript;
-    std::vector<Platform::EventScheduler::EventId> events;
-    std::map<std::uint32_t, std::uint64_t> bytesIn;
-    std::uint64_t lastNumber = 0;
-    std::size_t mostControls = 0;
+    const std::vector<std::string> paths_;
+    mutable std::mutex lock_;  ///< guards what follows
+    std::deque<std::unique_ptr<File>> files_;
+    std::deque<Transfer> running_;
+    std::map<std::uint32_t, std::deque<Answer>> scripts_;
+    std::map<std::string, std::function<Platform::ErrorCode()>> openActions_;
+    std::vector<std::string> transcript_;
+    std::vector<Platform::EventScheduler::EventId> events_;
+    std::map<std::uint32_t, std::uint64_t> bytesIn_;
+    std::uint64_t lastNumber_ = 0;
+    std::size_t mostControls_ = 0;
 };
 
 }  // namespace Varnholt::Tests

@@ -14,37 +14,37 @@ using Platform::Usb::TransferStatus;
 namespace Errors = Platform::Errors;
 
 ScriptedUsbDevice::ScriptedUsbDevice(std::vector<Exchange> rows)
-    : script(std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end())) {}
+    : script_(std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end())) {}
 
 ScriptedUsbDevice::~ScriptedUsbDevice() {
-    for (const std::uint64_t event : events) {
+    for (const std::uint64_t event : events_) {
         Platform::ClockScheduler().Forget(event);
     }
     Unplug();
-    if (!script.empty() && !failed) {
-        ADD_FAILURE() << script.size() << " rows of the script were not played; the next, row " << played
-                      << ":\n  expected: " << script.front().Describe();
+    if (!script_.empty() && !failed_) {
+        ADD_FAILURE() << script_.size() << " rows of the script were not played; the next, row " << played_
+                      << ":\n  expected: " << script_.front().Describe();
     }
 }
 
 void ScriptedUsbDevice::Expect(std::vector<Exchange> rows) {
-    const std::lock_guard guard(lock);
-    script.insert(script.end(), std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end()));
+    const std::lock_guard guard(lock_);
+    script_.insert(script_.end(), std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end()));
 }
 
 void ScriptedUsbDevice::LeaveToTest(std::uint8_t endpoint) {
-    const std::lock_guard guard(lock);
-    leftToTest.insert(endpoint);
+    const std::lock_guard guard(lock_);
+    leftToTest_.insert(endpoint);
 }
 
 void ScriptedUsbDevice::Send(std::uint8_t endpoint, Bytes data) {
     {
-        const std::lock_guard guard(lock);
-        const auto oldest = std::ranges::find_if(running, [endpoint](const Running& candidate) {
+        const std::lock_guard guard(lock_);
+        const auto oldest = std::ranges::find_if(running_, [endpoint](const Running& candidate) {
             return candidate.transfer->endpoint == endpoint && !candidate.ready;
         });
-        if (oldest == running.end()) {
-            unsent.emplace_back(endpoint, std::move(data));
+        if (oldest == running_.end()) {
+            unsent_.emplace_back(endpoint, std::move(data));
             return;
         }
         oldest->row = BulkIn(oldest->transfer->length, std::move(data), endpoint);
@@ -56,9 +56,9 @@ void ScriptedUsbDevice::Send(std::uint8_t endpoint, Bytes data) {
 void ScriptedUsbDevice::Unplug() {
     std::deque<Running> ended;
     {
-        const std::lock_guard guard(lock);
-        gone = true;
-        ended.swap(running);
+        const std::lock_guard guard(lock_);
+        gone_ = true;
+        ended.swap(running_);
     }
     for (Running& transfer : ended) {
         transfer.row = transfer.row.Ends(TransferStatus::DeviceGone);
@@ -67,13 +67,13 @@ void ScriptedUsbDevice::Unplug() {
 }
 
 std::size_t ScriptedUsbDevice::Pending(std::uint8_t endpoint) const {
-    const std::lock_guard guard(lock);
+    const std::lock_guard guard(lock_);
     return static_cast<std::size_t>(std::ranges::count(
-        running, endpoint, [](const Running& candidate) { return candidate.transfer->endpoint; }));
+        running_, endpoint, [](const Running& candidate) { return candidate.transfer->endpoint; }));
 }
 
 std::vector<Platform::Usb::EndpointInfo> ScriptedUsbDevice::Endpoints(Platform::ErrorCode& error) {
-    error = Get(endpointsAnswer);
+    error = Get(endpointsAnswer_);
     if (error != Platform::Errors::Success) {
         return {};
     }
@@ -83,18 +83,18 @@ std::vector<Platform::Usb::EndpointInfo> ScriptedUsbDevice::Endpoints(Platform::
 }
 
 ErrorCode ScriptedUsbDevice::Claim() {
-    const std::lock_guard guard(lock);
-    const ErrorCode answer = gone ? Errors::DeviceNotConnected : claimAnswer;
+    const std::lock_guard guard(lock_);
+    const ErrorCode answer = gone_ ? Errors::DeviceNotConnected : claimAnswer_;
     if (answer == Errors::Success) {
-        claimed = true;
-        ++timesClaimed;
+        claimed_ = true;
+        ++timesClaimed_;
     }
     return answer;
 }
 
 void ScriptedUsbDevice::Release() {
-    const std::lock_guard guard(lock);
-    claimed = false;
+    const std::lock_guard guard(lock_);
+    claimed_ = false;
 }
 
 ErrorCode ScriptedUsbDevice::Submit(Transfer& transfer) {
@@ -102,35 +102,35 @@ ErrorCode ScriptedUsbDevice::Submit(Transfer& transfer) {
     std::uint64_t number = 0;
     std::uint64_t delay = 0;
     {
-        const std::lock_guard guard(lock);
-        if (gone) {
+        const std::lock_guard guard(lock_);
+        if (gone_) {
             return Errors::DeviceNotConnected;
         }
-        number = ++lastNumber;
+        number = ++lastNumber_;
         Running submitted{number, &transfer, {}, false, false};
-        if (leftToTest.contains(endpoint)) {
+        if (leftToTest_.contains(endpoint)) {
             const auto waiting =
-                std::ranges::find(unsent, endpoint, [](const auto& sent) { return sent.first; });
-            if (waiting == unsent.end()) {
+                std::ranges::find(unsent_, endpoint, [](const auto& sent) { return sent.first; });
+            if (waiting == unsent_.end()) {
                 delay = Exchange::Never;
             } else {
                 submitted.row = BulkIn(transfer.length, std::move(waiting->second), endpoint);
-                unsent.erase(waiting);
+                unsent_.erase(waiting);
             }
-        } else if (script.empty() || !Matches(script.front(), transfer)) {
+        } else if (script_.empty() || !Matches(script_.front(), transfer)) {
             Mismatch(Describe(transfer));
             submitted.row.status = TransferStatus::Stalled;
         } else {
-            submitted.row = std::move(script.front());
-            script.pop_front();
-            ++played;
+            submitted.row = std::move(script_.front());
+            script_.pop_front();
+            ++played_;
             if (submitted.row.refusal != Errors::Success) {
                 return submitted.row.refusal;
             }
             delay = submitted.row.delay;
         }
         submitted.ready = delay == 0;
-        running.push_back(std::move(submitted));
+        running_.push_back(std::move(submitted));
     }
     if (delay == 0) {
         CompleteReady(endpoint);
@@ -145,19 +145,19 @@ void ScriptedUsbDevice::Cancel(Transfer& transfer) {
     Running ended{};
     bool later = false;
     {
-        const std::lock_guard guard(lock);
-        const auto found = std::ranges::find_if(running, [&transfer](const Running& candidate) {
+        const std::lock_guard guard(lock_);
+        const auto found = std::ranges::find_if(running_, [&transfer](const Running& candidate) {
             return candidate.transfer == &transfer && !candidate.cancelled;
         });
-        if (found == running.end()) {
+        if (found == running_.end()) {
             return;
         }
         found->row = found->row.Ends(TransferStatus::Cancelled, found->row.movedWhenCancelled);
         found->cancelled = true;
         ended = *found;
-        later = cancelLater;
+        later = cancelLater_;
         if (!later) {
-            running.erase(found);
+            running_.erase(found);
         }
     }
     if (later) {
@@ -169,53 +169,53 @@ void ScriptedUsbDevice::Cancel(Transfer& transfer) {
 }
 
 ErrorCode ScriptedUsbDevice::ClearHalt(std::uint8_t endpoint) {
-    const std::lock_guard guard(lock);
-    if (gone) {
+    const std::lock_guard guard(lock_);
+    if (gone_) {
         return Errors::DeviceNotConnected;
     }
-    if (script.empty() || script.front().kind != Exchange::Kind::ClearHalt ||
-        script.front().endpoint != endpoint) {
+    if (script_.empty() || script_.front().kind != Exchange::Kind::ClearHalt ||
+        script_.front().endpoint != endpoint) {
         Mismatch(HaltCleared(endpoint).Describe());
         return Errors::Success;
     }
-    const ErrorCode answer = script.front().refusal;
-    script.pop_front();
-    ++played;
+    const ErrorCode answer = script_.front().refusal;
+    script_.pop_front();
+    ++played_;
     if (answer == Errors::Success) {
-        halted.erase(endpoint);
+        halted_.erase(endpoint);
     }
     return answer;
 }
 
 std::shared_ptr<Platform::Usb::UsbDevice> ScriptedUsbDevice::OpenHandle(
     const std::shared_ptr<ScriptedUsbDevice>& device) {
-    const std::lock_guard guard(device->lock);
-    ++device->handles;
-    ++device->timesOpened;
+    const std::lock_guard guard(device->lock_);
+    ++device->handles_;
+    ++device->timesOpened_;
     return {device.get(), [device](Platform::Usb::UsbDevice*) {
-                const std::lock_guard closing(device->lock);
-                if (--device->handles == 0) {
-                    device->claimed = false;
+                const std::lock_guard closing(device->lock_);
+                if (--device->handles_ == 0) {
+                    device->claimed_ = false;
                 }
-                EXPECT_TRUE(device->handles > 0 || device->running.empty())
+                EXPECT_TRUE(device->handles_ > 0 || device->running_.empty())
                     << "the device was closed while transfers ran";
             }};
 }
 
 bool ScriptedUsbDevice::Matches(const Exchange& row, const Transfer& transfer) const {
     return row.kind == Exchange::Kind::Transfer && row.endpoint == transfer.endpoint &&
-           !halted.contains(transfer.endpoint) && row.length == transfer.length &&
+           !halted_.contains(transfer.endpoint) && row.length == transfer.length &&
            (row.endpoint != 0 || row.setup == transfer.setup) &&
            (row.IsIn() || std::equal(row.sent.begin(), row.sent.end(), transfer.data));
 }
 
 void ScriptedUsbDevice::Mismatch(const std::string& actual) {
     // One difference makes all that follow differ.
-    if (!failed) {
-        failed = true;
-        ADD_FAILURE() << "row " << played << " of the script differs\n  expected: "
-                      << (script.empty() ? "nothing more" : script.front().Describe())
-                      << "\n  actual:   " << actual << (halted.empty() ? "" : " (an endpoint is halted)");
+    if (!failed_) {
+        failed_ = true;
+        ADD_FAILURE() << "row " << played_ << " of the script differs\n  expected: "
+                      << (script_.empty() ? "nothing more" : script_.front().Describe())
+                      << "\n  actual:   " << actual << (halted_.empty() ? "" : " (an endpoint is halted)");
     }
 }
 
@@ -223,17 +223,17 @@ void ScriptedUsbDevice::CompleteReady(std::uint8_t endpoint) {
     for (;;) {
         Running ended{};
         {
-            const std::lock_guard guard(lock);
-            const auto oldest = std::ranges::find_if(running, [endpoint](const Running& candidate) {
+            const std::lock_guard guard(lock_);
+            const auto oldest = std::ranges::find_if(running_, [endpoint](const Running& candidate) {
                 return candidate.transfer->endpoint == endpoint && !candidate.cancelled;
             });
-            if (oldest == running.end() || !oldest->ready) {
+            if (oldest == running_.end() || !oldest->ready) {
                 return;
             }
             ended = std::move(*oldest);
-            running.erase(oldest);
-            if (ended.row.status == TransferStatus::Stalled && endpoint != 0 && !failed) {
-                halted.insert(endpoint);
+            running_.erase(oldest);
+            if (ended.row.status == TransferStatus::Stalled && endpoint != 0 && !failed_) {
+                halted_.insert(endpoint);
             }
         }
         Finish(ended);
@@ -246,16 +246,16 @@ void ScriptedUsbDevice::CompleteLater(std::uint64_t number, std::uint64_t delay)
         Running ended{};
         std::uint8_t endpoint = 0;
         {
-            const std::lock_guard guard(lock);
-            const auto found = std::ranges::find(running, number, &Running::number);
-            if (found == running.end()) {
+            const std::lock_guard guard(lock_);
+            const auto found = std::ranges::find(running_, number, &Running::number);
+            if (found == running_.end()) {
                 return;
             }
             endpoint = found->transfer->endpoint;
             found->ready = true;
             if (found->cancelled) {
                 ended = std::move(*found);
-                running.erase(found);
+                running_.erase(found);
             }
         }
         if (ended.transfer != nullptr) {
@@ -263,8 +263,8 @@ void ScriptedUsbDevice::CompleteLater(std::uint64_t number, std::uint64_t delay)
         }
         CompleteReady(endpoint);
     });
-    const std::lock_guard guard(lock);
-    events.push_back(event);
+    const std::lock_guard guard(lock_);
+    events_.push_back(event);
 }
 
 void ScriptedUsbDevice::Finish(const Running& completed) {
@@ -280,50 +280,50 @@ void ScriptedUsbDevice::Finish(const Running& completed) {
 }
 
 void ScriptedBus::Plug(const std::string& name, std::shared_ptr<ScriptedUsbDevice> device) {
-    const std::lock_guard guard(lock);
-    devices.emplace_back(name, std::move(device));
+    const std::lock_guard guard(lock_);
+    devices_.emplace_back(name, std::move(device));
 }
 
 ScriptedBus::Devices::iterator ScriptedBus::FindDevice(const std::string& name) {
-    return std::ranges::find(devices, name, [](const auto& device) { return device.first; });
+    return std::ranges::find(devices_, name, [](const auto& device) { return device.first; });
 }
 
 void ScriptedBus::Unplug(const std::string& name) {
     std::shared_ptr<ScriptedUsbDevice> unplugged;
     {
-        const std::lock_guard guard(lock);
+        const std::lock_guard guard(lock_);
         const auto found = FindDevice(name);
-        if (found == devices.end()) {
+        if (found == devices_.end()) {
             return;
         }
         unplugged = std::move(found->second);
-        devices.erase(found);
+        devices_.erase(found);
     }
     unplugged->Unplug();
 }
 
 void ScriptedBus::AnswerOpen(ErrorCode code) {
-    const std::lock_guard guard(lock);
-    openAnswer = code;
+    const std::lock_guard guard(lock_);
+    openAnswer_ = code;
 }
 
 std::vector<std::string> ScriptedBus::List() {
-    const std::lock_guard guard(lock);
+    const std::lock_guard guard(lock_);
     std::vector<std::string> names;
-    for (const auto& device : devices) {
+    for (const auto& device : devices_) {
         names.push_back(device.first);
     }
     return names;
 }
 
 std::shared_ptr<Platform::Usb::UsbDevice> ScriptedBus::Open(const std::string& name, ErrorCode& error) {
-    const std::lock_guard guard(lock);
-    error = openAnswer;
+    const std::lock_guard guard(lock_);
+    error = openAnswer_;
     if (error != Errors::Success) {
         return nullptr;
     }
     const auto found = FindDevice(name);
-    if (found == devices.end()) {
+    if (found == devices_.end()) {
         error = Errors::FileNotFound;
         return nullptr;
     }

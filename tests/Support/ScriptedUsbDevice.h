@@ -31,18 +31,18 @@ class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
     /// Answers the oldest transfer on an endpoint left to the test, or the next one.
     void Send(std::uint8_t endpoint, Bytes data);
     /// Cancellations complete later, on the clock's scheduler, instead of inside `Cancel`.
-    void CancelLater(bool later) { Set(cancelLater, later); }
+    void CancelLater(bool later) { Set(cancelLater_, later); }
     /// Pending transfers end with `DeviceGone`; nothing is accepted any more.
     void Unplug();
     /// What `Claim` answers from now on.
-    void AnswerClaim(Platform::ErrorCode code) { Set(claimAnswer, code); }
+    void AnswerClaim(Platform::ErrorCode code) { Set(claimAnswer_, code); }
     /// Whether `Endpoints` succeeds from now on.
-    void AnswerEndpoints(Platform::ErrorCode code) { Set(endpointsAnswer, code); }
+    void AnswerEndpoints(Platform::ErrorCode code) { Set(endpointsAnswer_, code); }
 
-    bool IsClaimed() const { return Get(claimed); }
-    bool IsOpen() const { return Get(handles) > 0; }
-    std::uint32_t TimesOpened() const { return Get(timesOpened); }
-    std::uint32_t TimesClaimed() const { return Get(timesClaimed); }
+    bool IsClaimed() const { return Get(claimed_); }
+    bool IsOpen() const { return Get(handles_) > 0; }
+    std::uint32_t TimesOpened() const { return Get(timesOpened_); }
+    std::uint32_t TimesClaimed() const { return Get(timesClaimed_); }
     std::size_t Pending(std::uint8_t endpoint) const;
 
     std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override;
@@ -67,12 +67,12 @@ class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
 
     template <class Value>
     Value Get(const Value& member) const {
-        const std::lock_guard guard(lock);
+        const std::lock_guard guard(lock_);
         return member;
     }
     template <class Value>
     void Set(Value& member, Value value) {
-        const std::lock_guard guard(lock);
+        const std::lock_guard guard(lock_);
         member = value;
     }
     bool Matches(const Exchange& row, const Platform::Usb::Transfer& transfer) const;
@@ -81,24 +81,24 @@ class ScriptedUsbDevice final : public Platform::Usb::UsbDevice {
     void CompleteLater(std::uint64_t number, std::uint64_t delay);
     static void Finish(const Running& completed);
 
-    mutable std::mutex lock;  // guards all that follows; not held while others are called
-    std::deque<Exchange> script;
-    std::size_t played = 0;
-    bool failed = false;
-    std::deque<Running> running;  // oldest first
-    std::uint64_t lastNumber = 0;
-    std::vector<std::uint64_t> events;
-    std::set<std::uint8_t> leftToTest;
-    std::deque<std::pair<std::uint8_t, Bytes>> unsent;
-    std::set<std::uint8_t> halted;
-    bool cancelLater = false;
-    bool gone = false;
-    bool claimed = false;
-    std::uint32_t handles = 0;
-    std::uint32_t timesOpened = 0;
-    std::uint32_t timesClaimed = 0;
-    Platform::ErrorCode claimAnswer = Platform::Errors::Success;
-    Platform::ErrorCode endpointsAnswer = Platform::Errors::Success;
+    mutable std::mutex lock_;  // guards all that follows; not held while others are called
+    std::deque<Exchange> script_;
+    std::size_t played_ = 0;
+    bool failed_ = false;
+    std::deque<Running> running_;  // oldest first
+    std::uint64_t lastNumber_ = 0;
+    std::vector<std::uint64_t> events_;
+    std::set<std::uint8_t> leftToTest_;
+    std::deque<std::pair<std::uint8_t, Bytes>> unsent_;
+    std::set<std::uint8_t> halted_;
+    bool cancelLater_ = false;
+    bool gone_ = false;
+    bool claimed_ = false;
+    std::uint32_t handles_ = 0;
+    std::uint32_t timesOpened_ = 0;
+    std::uint32_t timesClaimed_ = 0;
+    Platform::ErrorCode claimAnswer_ = Platform::Errors::Success;
+    Platform::ErrorCode endpointsAnswer_ = Platform::Errors::Success;
 };
 
 /// A bus with such devices, in the order in which they were plugged in.
@@ -118,9 +118,9 @@ class ScriptedBus final : public Platform::Usb::UsbBus {
     using Devices = std::vector<std::pair<std::string, std::shared_ptr<ScriptedUsbDevice>>>;
     Devices::iterator FindDevice(const std::string& name);
 
-    std::mutex lock;
-    Devices devices;
-    Platform::ErrorCode openAnswer = Platform::Errors::Success;
+    std::mutex lock_;
+    Devices devices_;
+    Platform::ErrorCode openAnswer_ = Platform::Errors::Success;
 };
 
 }  // namespace Varnholt::Tests

@@ -16,26 +16,26 @@ namespace Varnholt::Tests {
 /// over the bus, and the host answers the 64-bit question so that the library uses the given transport.
 class SimulatedHost final {
   public:
-    explicit SimulatedHost(Transport transport) : path(std::string(Name(transport)) + "/") {
+    explicit SimulatedHost(Transport transport) : path_(std::string(Name(transport)) + "/") {
         Platform::Override64BitHost(transport == Transport::UsbIo);
     }
     ~SimulatedHost() { Platform::Override64BitHost(std::nullopt); }
     SimulatedHost(const SimulatedHost&) = delete;
     SimulatedHost& operator=(const SimulatedHost&) = delete;
 
-    Simulator::SimulatedBus& Bus() { return bus; }
+    Simulator::SimulatedBus& Bus() { return bus_; }
     Simulator::SimulatedInstrument& Add(const std::string& name,
                                         Simulator::InstrumentSettings settings = {}) {
-        return bus.Add(name, std::move(settings));
+        return bus_.Add(name, std::move(settings));
     }
     /// The identifier under which the library lists the instrument.
-    std::string Identifier(const std::string& name) const { return path + name; }
+    std::string Identifier(const std::string& name) const { return path_ + name; }
 
   private:
-    const std::string path;
-    Simulator::SimulatedBus bus{Platform::ClockScheduler()};
-    const std::unique_ptr<Platform::DeviceFileSystem> files = Platform::Drivers::MakeDriverFileSystem(bus);
-    const Platform::ScopedDeviceFiles inForce{*files};
+    const std::string path_;
+    Simulator::SimulatedBus bus_{Platform::ClockScheduler()};
+    const std::unique_ptr<Platform::DeviceFileSystem> files_ = Platform::Drivers::MakeDriverFileSystem(bus_);
+    const Platform::ScopedDeviceFiles inForce_{*files_};
 };
 
 }  // namespace Varnholt::Tests

@@ -31,7 +31,7 @@ class TestClock final {
             return;
         }
 #endif
-        clock.emplace(seed);
+        clock_.emplace(seed);
 #endif
     }
 #if defined(_WIN32) || defined(__SANITIZE_THREAD__)
@@ -46,32 +46,32 @@ class TestClock final {
     }
 #else
     bool IsVirtual() const {
-        return clock.has_value();
+        return clock_.has_value();
     }
 
   private:
-    std::optional<Simulator::VirtualClock> clock;
+    std::optional<Simulator::VirtualClock> clock_;
 #endif
 };
 
 /// Milliseconds since it was made, of the time in force.
 class Stopwatch final {
   public:
-    explicit Stopwatch(const TestClock& clock) : isExact(clock.IsVirtual()) {}
+    explicit Stopwatch(const TestClock& clock) : isExact_(clock.IsVirtual()) {}
 
-    std::uint64_t Milliseconds() const { return (Platform::ClockScheduler().Now() - begin) / 1000; }
+    std::uint64_t Milliseconds() const { return (Platform::ClockScheduler().Now() - begin_) / 1000; }
     /// Exactly so long in virtual time; not much longer in real time.
     void Expect(std::uint64_t milliseconds) const { ExpectBetween(milliseconds, milliseconds); }
     void ExpectAtMost(std::uint64_t milliseconds) const { ExpectBetween(0, milliseconds); }
     void ExpectBetween(std::uint64_t least, std::uint64_t most) const {
         const std::uint64_t elapsed = Milliseconds();
-        EXPECT_GE(elapsed + (isExact ? 0 : 1), least);
-        EXPECT_LE(elapsed, most + (isExact ? 0 : 2000));
+        EXPECT_GE(elapsed + (isExact_ ? 0 : 1), least);
+        EXPECT_LE(elapsed, most + (isExact_ ? 0 : 2000));
     }
 
   private:
-    const bool isExact;
-    const std::uint64_t begin = Platform::ClockScheduler().Now();
+    const bool isExact_;
+    const std::uint64_t begin_ = Platform::ClockScheduler().Now();
 };
 
 }  // namespace Varnholt::Tests

@@ -19,22 +19,22 @@ class TestFolder final {
         const auto* const test = testing::UnitTest::GetInstance()->current_test_info();
         std::string name = std::string("ostra-") + test->test_suite_name() + "-" + test->name();
         std::replace(name.begin(), name.end(), '/', '-');
-        folder = std::filesystem::temp_directory_path() / name;
-        std::filesystem::remove_all(folder);
-        std::filesystem::create_directories(folder);
+        folder_ = std::filesystem::temp_directory_path() / name;
+        std::filesystem::remove_all(folder_);
+        std::filesystem::create_directories(folder_);
     }
     ~TestFolder() {
         std::error_code ignored;
-        std::filesystem::remove_all(folder, ignored);
+        std::filesystem::remove_all(folder_, ignored);
     }
     TestFolder(const TestFolder&) = delete;
     TestFolder& operator=(const TestFolder&) = delete;
 
-    std::string Path(const std::string& name) const { return (folder / name).string(); }
+    std::string Path(const std::string& name) const { return (folder_ / name).string(); }
     /// Names of the files, in order.
     std::vector<std::string> Files() const {
         std::vector<std::string> names;
-        for (const auto& entry : std::filesystem::directory_iterator(folder)) {
+        for (const auto& entry : std::filesystem::directory_iterator(folder_)) {
             names.push_back(entry.path().filename().string());
         }
         std::sort(names.begin(), names.end());
@@ -42,7 +42,7 @@ class TestFolder final {
     }
 
   private:
-    std::filesystem::path folder;
+    std::filesystem::path folder_;
 };
 
 inline std::vector<std::uint8_t> ReadFile(const std::string& path) {

@@ -67,8 +67,8 @@ struct TestTransfer final : Platform::Usb::Transfer, private Platform::Usb::Tran
 
     /// True once it has completed; gives up after a time that is long for any of it.
     bool Wait(std::chrono::milliseconds patience = std::chrono::seconds(20)) {
-        std::unique_lock lock(mutex);
-        return changed.wait_for(lock, patience, [this] { return completions > 0; });
+        std::unique_lock lock(mutex_);
+        return changed_.wait_for(lock, patience, [this] { return completions > 0; });
     }
     Bytes Data() const {
         return {buffer.begin(), buffer.begin() + static_cast<std::ptrdiff_t>(actualLength)};
@@ -85,13 +85,13 @@ struct TestTransfer final : Platform::Usb::Transfer, private Platform::Usb::Tran
         actualLength = 0xFFFFFFFF;
     }
     void TransferCompleted(Platform::Usb::Transfer&) noexcept override {
-        const std::lock_guard lock(mutex);
+        const std::lock_guard lock(mutex_);
         ++completions;
-        changed.notify_all();
+        changed_.notify_all();
     }
 
-    std::mutex mutex;
-    std::condition_variable changed;
+    std::mutex mutex_;
+    std::condition_variable changed_;
 };
 
 }  // namespace Varnholt::Tests

@@ -16,37 +16,37 @@ namespace Varnholt::Tests {
 /// A device whose own allocations do not fail.
 class ExemptDevice final : public Platform::Usb::UsbDevice {
   public:
-    explicit ExemptDevice(std::shared_ptr<Platform::Usb::UsbDevice> behind) : device(std::move(behind)) {}
+    explicit ExemptDevice(std::shared_ptr<Platform::Usb::UsbDevice> behind) : device_(std::move(behind)) {}
     ~ExemptDevice() override {
         const Exempt guard;
-        device.reset();
+        device_.reset();
     }
     std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
-        return device->Endpoints(error);
+        return device_->Endpoints(error);
     }
     Platform::ErrorCode Claim() override {
         const Exempt guard;
-        return device->Claim();
+        return device_->Claim();
     }
     void Release() override {
         const Exempt guard;
-        device->Release();
+        device_->Release();
     }
     Platform::ErrorCode Submit(Platform::Usb::Transfer& transfer) override {
         const Exempt guard;
-        return device->Submit(transfer);
+        return device_->Submit(transfer);
     }
     void Cancel(Platform::Usb::Transfer& transfer) override {
         const Exempt guard;
-        device->Cancel(transfer);
+        device_->Cancel(transfer);
     }
     Platform::ErrorCode ClearHalt(std::uint8_t endpoint) override {
         const Exempt guard;
-        return device->ClearHalt(endpoint);
+        return device_->ClearHalt(endpoint);
     }
 
   private:
-    std::shared_ptr<Platform::Usb::UsbDevice> device;
+    std::shared_ptr<Platform::Usb::UsbDevice> device_;
 };
 
 /// The virtual clock makes a thread when an event comes while a lock is held; that one is not to be counted.

@@ -165,22 +165,22 @@ bool MayGoUnnoticed(Transport transport, const Fault& fault, const RecordedTrans
 
 class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size_t>> {
   protected:
-    const Transport transport = std::get<0>(GetParam());
-    const Operation operation = Operations()[std::get<1>(GetParam())];
+    const Transport transport_ = std::get<0>(GetParam());
+    const Operation operation_ = Operations()[std::get<1>(GetParam())];
 
     Simulator::InstrumentSettings Settings() const {
         Simulator::InstrumentSettings settings;
-        settings.scanBytes = operation.scanBytes;
+        settings.scanBytes = operation_.scanBytes;
         return settings;
     }
 
     std::vector<RecordedTransfer> Undisturbed() const {
         const TestClock clock(TestTime::Virtual, 1);
-        SimulatedHost host(transport);
+        SimulatedHost host(transport_);
         host.Add("one", Settings());
         Simulator::TransferRecorder recorder;
         host.Bus().WrapDevices([&](const std::string&, auto device) { return recorder.Record(device); });
-        EXPECT_EQ(operation.run(), std::nullopt);
+        EXPECT_EQ(operation_.run(), std::nullopt);
         return recorder.Transfers();
     }
 
@@ -189,30 +189,30 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
         const Fault& fault = plan.Faults().front();
         const TestClock clock(TestTime::Virtual, fault.index + 1);
         const Stopwatch stopwatch(clock);
-        SimulatedHost host(transport);
+        SimulatedHost host(transport_);
         auto& instrument = host.Add("one", Settings());
         const auto script = std::make_shared<Simulator::FaultScript>(plan);
         host.Bus().WrapDevices([&](const std::string&, auto device) {
             return Simulator::InjectFaults(device, script, Platform::ClockScheduler(),
                                            [&] { instrument.Unplug(); });
         });
-        if (operation.check) {
-            instrument.SetEeprom(operation.eeprom);
+        if (operation_.check) {
+            instrument.SetEeprom(operation_.eeprom);
         }
-        const Outcome outcome = operation.run();
+        const Outcome outcome = operation_.run();
         stopwatch.ExpectAtMost(TimeLimit);
         if (outcome) {
-            EXPECT_TRUE(IsDocumented(transport, *outcome)) << *outcome;
+            EXPECT_TRUE(IsDocumented(transport_, *outcome)) << *outcome;
         } else if (script->Hits() > 0 && script->Transfers() > fault.index) {
-            EXPECT_TRUE(MayGoUnnoticed(transport, fault, undisturbed, operation.endsWithShortTransfer))
+            EXPECT_TRUE(MayGoUnnoticed(transport_, fault, undisturbed, operation_.endsWithShortTransfer))
                 << "passed all the same";
         }
         EXPECT_EQ(instrument.PendingTransfers(), 0U);
         EXPECT_FALSE(instrument.Claimed());
 
-        if (operation.check) {
-            operation.check(instrument.Eeprom(), fault, undisturbed.endpoint);
-            instrument.SetEeprom(operation.eeprom);
+        if (operation_.check) {
+            operation_.check(instrument.Eeprom(), fault, undisturbed.endpoint);
+            instrument.SetEeprom(operation_.eeprom);
         }
 
         // The next open works, or says that the device is gone.
@@ -221,7 +221,7 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
             EXPECT_THROW(PellandoFunctionality(nullptr, 0), DeviceDriverException);
             instrument.PlugIn();
         }
-        const Outcome next = operation.run();
+        const Outcome next = operation_.run();
         EXPECT_EQ(next, std::nullopt) << *next;
     }
 };
@@ -277,7 +277,7 @@ std::vector<Fault> FaultsOver(const Operation& operation, std::size_t count) {
 
 TEST_P(FaultSweep, EveryFaultAtEveryTransfer) {
     const std::vector<RecordedTransfer> undisturbed = Undisturbed();
-    const std::vector<Fault> faults = FaultsOver(operation, undisturbed.size());
+    const std::vector<Fault> faults = FaultsOver(operation_, undisturbed.size());
     EXPECT_GT(faults.size(), 50U);
     // In real time there is time for some of them only: steps that go round through all spread what is tried.
     const bool inRealTime = !TestClock(TestTime::Virtual).IsVirtual();

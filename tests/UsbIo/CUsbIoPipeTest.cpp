@@ -21,24 +21,24 @@ class CUsbIoPipeTest : public Tests::DriverTest {
   protected:
     void SetUp() override {
         const ScopedDeviceList list(InterfaceClass);
-        ASSERT_EQ(pipe.Bind(0, BulkInEndpoint, list.Get(), &InterfaceClass), Status::Success);
-        driver.TakeTranscript();
+        ASSERT_EQ(pipe_.Bind(0, BulkInEndpoint, list.Get(), &InterfaceClass), Status::Success);
+        driver_.TakeTranscript();
     }
     /// Starts a read that fills the buffer.
     void StartRead(CUsbIoBuffer& buffer) {
         buffer.NumberOfBytesToTransfer = buffer.Size;
-        ASSERT_TRUE(pipe.Read(buffer));
+        ASSERT_TRUE(pipe_.Read(buffer));
     }
 
-    CUsbIoPipe pipe;
+    CUsbIoPipe pipe_;
 };
 
 TEST_F(CUsbIoPipeTest, BindOpensOnlyAClosedPipe) {
-    EXPECT_EQ(pipe.Bind(0, BulkOutEndpoint, nullptr, nullptr), Status::Success);
-    EXPECT_EQ(pipe.AbortPipe(), Status::Success);
-    EXPECT_THAT(driver.TakeTranscript(), ElementsAre("control 80942078 03 /", "control 80942084 /"));
+    EXPECT_EQ(pipe_.Bind(0, BulkOutEndpoint, nullptr, nullptr), Status::Success);
+    EXPECT_EQ(pipe_.AbortPipe(), Status::Success);
+    EXPECT_THAT(driver_.TakeTranscript(), ElementsAre("control 80942078 03 /", "control 80942084 /"));
     CUsbIoPipe other;
-    driver.RefuseOpen("\\\\.\\USBIO_Device7", Platform::Errors::AccessDenied);
+    driver_.RefuseOpen("\\\\.\\USBIO_Device7", Platform::Errors::AccessDenied);
     EXPECT_EQ(other.Bind(7, BulkInEndpoint, nullptr, nullptr), Platform::Errors::AccessDenied);
     EXPECT_FALSE(other.IsOpen());
 }
@@ -76,85 +76,85 @@ TEST_F(CUsbIoPipeTest, ReadSyncReportsStatusAndBytesMoved) {
     };
     for (const auto& row : cases) {
         SCOPED_TRACE(row.name);
-        driver.Script(BulkInEndpoint, row.answer);
+        driver_.Script(BulkInEndpoint, row.answer);
         Bytes buffer(4, 0xEE), expected(4, 0xEE);
         std::uint32_t size = 4;
-        const Tests::Stopwatch stopwatch(clock);
-        EXPECT_EQ(pipe.ReadSync(buffer.data(), size, 100), row.status);
+        const Tests::Stopwatch stopwatch(clock_);
+        EXPECT_EQ(pipe_.ReadSync(buffer.data(), size, 100), row.status);
         stopwatch.ExpectBetween(row.milliseconds, row.milliseconds + 1);
         EXPECT_EQ(size, row.moved);
         std::copy_n(data.begin(), row.moved, expected.begin());
         EXPECT_EQ(buffer, expected);
-        EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+        EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
     }
     std::uint8_t byte = 0;
     std::uint32_t size = 1;
-    EXPECT_EQ(pipe.ReadSync(&byte, size, 0), Status::TimedOut);
+    EXPECT_EQ(pipe_.ReadSync(&byte, size, 0), Status::TimedOut);
 }
 
 TEST_F(CUsbIoPipeTest, WriteSyncSendsTheBytes) {
     const std::vector<std::uint8_t> data{1, 0x2C};
     std::uint32_t size = 2;
-    driver.Script(BulkInEndpoint, {.after = 10});
-    EXPECT_EQ(pipe.WriteSync(data.data(), size, Platform::Infinite), Status::Success);
+    driver_.Script(BulkInEndpoint, {.after = 10});
+    EXPECT_EQ(pipe_.WriteSync(data.data(), size, Platform::Infinite), Status::Success);
     EXPECT_EQ(size, 2U);
-    driver.Script(BulkInEndpoint, {.after = Never});
-    EXPECT_EQ(pipe.WriteSync(data.data(), size, 20), Status::TimedOut);
+    driver_.Script(BulkInEndpoint, {.after = Never});
+    EXPECT_EQ(pipe_.WriteSync(data.data(), size, 20), Status::TimedOut);
     EXPECT_EQ(size, 0U);
-    EXPECT_THAT(driver.TakeTranscript(), ElementsAre("write 82 01 2C", "write 82 01 2C", "cancel 82"));
+    EXPECT_THAT(driver_.TakeTranscript(), ElementsAre("write 82 01 2C", "write 82 01 2C", "cancel 82"));
 }
 
 TEST_F(CUsbIoPipeTest, AnEventEndsTheWaitButNotTheTransfer) {
     const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
-    driver.Script(BulkInEndpoint, {.data = {5}, .after = 80});
+    driver_.Script(BulkInEndpoint, {.data = {5}, .after = 80});
     CUsbIoBuffer buffer(8);
     StartRead(buffer);
     EXPECT_EQ(buffer.Status, Pending);
-    EXPECT_EQ(pipe.WaitForCompletion(buffer, 0), Status::TimedOut);
-    EXPECT_EQ(pipe.WaitForCompletion(buffer, 20, event.Get()), Status::TimedOut);
+    EXPECT_EQ(pipe_.WaitForCompletion(buffer, 0), Status::TimedOut);
+    EXPECT_EQ(pipe_.WaitForCompletion(buffer, 20, event.Get()), Status::TimedOut);
     Platform::SignalEvent(event.Get());
-    EXPECT_EQ(pipe.WaitForCompletion(buffer, Platform::Infinite, event.Get()), Status::UserEvent);
+    EXPECT_EQ(pipe_.WaitForCompletion(buffer, Platform::Infinite, event.Get()), Status::UserEvent);
     EXPECT_EQ(buffer.Status, Pending);
-    EXPECT_EQ(pipe.WaitForCompletion(buffer, Platform::Infinite, event.Get()), Status::Success);
+    EXPECT_EQ(pipe_.WaitForCompletion(buffer, Platform::Infinite, event.Get()), Status::Success);
     EXPECT_EQ(buffer.BytesTransferred, 1U);
-    EXPECT_EQ(pipe.WaitForCompletion(buffer, Platform::Infinite), Status::Success);
+    EXPECT_EQ(pipe_.WaitForCompletion(buffer, Platform::Infinite), Status::Success);
 }
 
 TEST_F(CUsbIoPipeTest, AWaitThatThePlatformRefusesIsPassedOn) {
-    driver.Script(BulkInEndpoint, {.after = Never});
+    driver_.Script(BulkInEndpoint, {.after = Never});
     CUsbIoBuffer buffer(8);
     StartRead(buffer);
     char noHandle = 0;
-    EXPECT_EQ(pipe.WaitForCompletion(buffer, 10, &noHandle), 0xFFFFFFFF);
+    EXPECT_EQ(pipe_.WaitForCompletion(buffer, 10, &noHandle), 0xFFFFFFFF);
     EXPECT_EQ(buffer.Status, Pending);
 }
 
 TEST_F(CUsbIoPipeTest, RefusesTransfersThatCannotBeRight) {
     CUsbIoBuffer buffer(8);
     buffer.NumberOfBytesToTransfer = 9;
-    EXPECT_FALSE(pipe.Read(buffer));
+    EXPECT_FALSE(pipe_.Read(buffer));
     EXPECT_EQ(buffer.Status, Platform::Errors::InvalidParameter);
     buffer.NumberOfBytesToTransfer = 8;
-    pipe.Close();
-    EXPECT_FALSE(pipe.Write(buffer));
+    pipe_.Close();
+    EXPECT_FALSE(pipe_.Write(buffer));
     EXPECT_EQ(buffer.Status, Platform::Errors::InvalidHandle);
 
     Platform::InstallCallFilter([](std::string_view) { return Platform::Errors::NoSystemResources; });
     CUsbIoBuffer withoutEvent(8);
     Platform::InstallCallFilter({});
     withoutEvent.NumberOfBytesToTransfer = 8;
-    EXPECT_FALSE(pipe.Read(withoutEvent));
+    EXPECT_FALSE(pipe_.Read(withoutEvent));
     EXPECT_EQ(withoutEvent.Status, Platform::Errors::NoSystemResources);
 }
 
 TEST_F(CUsbIoPipeTest, ABufferOutlivesItsTransfer) {
-    driver.Script(BulkInEndpoint,
-                  {.data = {1, 2}, .after = Never, .cancelledAfter = 40, .cancelledWithData = true});
+    driver_.Script(BulkInEndpoint,
+                   {.data = {1, 2}, .after = Never, .cancelledAfter = 40, .cancelledWithData = true});
     {
         CUsbIoBuffer buffer(2);
         StartRead(buffer);
     }
-    EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+    EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
 }
 
 TEST(CUsbIoPipeRace, NoByteIsLostOrCountedTwiceWhenATimeOutMeetsACompletion) {

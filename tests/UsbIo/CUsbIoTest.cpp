@@ -71,7 +71,7 @@ TEST_F(CUsbIoTest, OpensByListAndByNumber) {
     EXPECT_EQ(device.GetDevicePathName(), nullptr);
     device.Close();
     const std::string ask = "control 8094206C / [12]";
-    EXPECT_THAT(driver.TakeTranscript(),
+    EXPECT_THAT(driver_.TakeTranscript(),
                 ElementsAre("open usbio/2", ask, ask, "close usbio/2", "open \\\\.\\USBIO_Device3", ask,
                             "close \\\\.\\USBIO_Device3"));
 }
@@ -87,11 +87,11 @@ TEST_F(CUsbIoTest, AcceptsInterfaceVersions2From30On) {
         {0x3002, Status::VersionMismatch},
     };
     for (const auto& [version, expected] : cases) {
-        driver.Script(Control::GetDriverInfo, {.data = {static_cast<std::uint8_t>(version),
-                                                        static_cast<std::uint8_t>(version >> 8)}});
+        driver_.Script(Control::GetDriverInfo, {.data = {static_cast<std::uint8_t>(version),
+                                                         static_cast<std::uint8_t>(version >> 8)}});
         CUsbIo device;
         EXPECT_EQ(Open(device), expected) << std::hex << version;
-        EXPECT_EQ(driver.OpenFiles(), expected == 0 ? 1U : 0U);
+        EXPECT_EQ(driver_.OpenFiles(), expected == 0 ? 1U : 0U);
         EXPECT_EQ(device.GetDevicePathName() != nullptr, expected == 0);
     }
 }
@@ -110,15 +110,15 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
     const std::vector<Case> cases{
         {"no such device", 2, [] {}, Status::NoSuchDeviceInstance},
         {"negative number", -1, [] {}, Status::NoSuchDeviceInstance},
-        {"file not found", 0, [&] { driver.RefuseOpen("usbio/1", 2); }, Status::DeviceNotFound},
-        {"file refused", 0, [&] { driver.RefuseOpen("usbio/1", 5); }, 5},
+        {"file not found", 0, [&] { driver_.RefuseOpen("usbio/1", 2); }, Status::DeviceNotFound},
+        {"file refused", 0, [&] { driver_.RefuseOpen("usbio/1", 5); }, 5},
         {"no event", 1, [&] { failing("MakeAutoResetEvent", 8); }, Status::NoMemory},
         {"no enumeration", 0, [&] { failing("LoadEnumeration", 126); }, Status::NoEnumeration},
         {"interface cannot be found", 0, [&] { failing("FindInterface", 13); }, 13},
         {"no detail", 0, [&] { failing("DetailSize", 13); }, Status::Failed},
         {"detail cannot be read", 0, [&] { failing("ReadDetail", 13); }, 13},
-        {"driver refuses", 1, [&] { driver.Script(Control::GetDriverInfo, {.code = 31, .after = 5}); }, 31},
-        {"driver tells nothing", 1, [&] { driver.Script(Control::GetDriverInfo, {}); },
+        {"driver refuses", 1, [&] { driver_.Script(Control::GetDriverInfo, {.code = 31, .after = 5}); }, 31},
+        {"driver tells nothing", 1, [&] { driver_.Script(Control::GetDriverInfo, {}); },
          Status::VersionMismatch},
     };
     for (const Case& row : cases) {
@@ -131,7 +131,7 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
         Platform::InstallCallFilter({});
         EXPECT_FALSE(device.IsOpen()) << row.name;
         EXPECT_EQ(device.GetDevicePathName(), nullptr) << row.name;
-        EXPECT_EQ(driver.OpenFiles(), 0U) << row.name;
+        EXPECT_EQ(driver_.OpenFiles(), 0U) << row.name;
         EXPECT_EQ(Open(device, 1), Status::Success) << row.name;
     }
     const ScopedDeviceList list(InterfaceClass);
@@ -151,13 +151,13 @@ TEST_F(CUsbIoTest, AClosedObjectTouchesNothing) {
     EXPECT_EQ(device.GetDeviceParameters(parameters), Status::DeviceNotOpen);
     EXPECT_EQ(device.ClassOrVendorOutRequest(nullptr, length, {}), Status::DeviceNotOpen);
     device.Close();
-    EXPECT_THAT(driver.TakeTranscript(), IsEmpty());
+    EXPECT_THAT(driver_.TakeTranscript(), IsEmpty());
 }
 
 TEST_F(CUsbIoTest, SendsTheDriversRecords) {
     CUsbIo device;
     ASSERT_EQ(Open(device), Status::Success);
-    driver.TakeTranscript();
+    driver_.TakeTranscript();
 
     const std::array<InterfaceSetting, 2> interfaces{{{0, 1, 65536}, {0x0203, 0x0405, 0x06070809}}};
     EXPECT_EQ(device.UnconfigureDevice(), 0U);
@@ -179,7 +179,7 @@ TEST_F(CUsbIoTest, SendsTheDriversRecords) {
     std::uint32_t length = data.size();
     EXPECT_EQ(device.ClassOrVendorOutRequest(data.data(), length, request), 0U);
     EXPECT_EQ(length, 3U);
-    driver.Script(Control::ClassOrVendorInRequest, {.data = {9, 8}, .after = 3});
+    driver_.Script(Control::ClassOrVendorInRequest, {.data = {9, 8}, .after = 3});
     EXPECT_EQ(device.ClassOrVendorInRequest(data.data(), length, request), 0U);
     EXPECT_EQ(length, 2U);
     EXPECT_THAT(data, ElementsAre(9, 8, 3));
@@ -190,7 +190,7 @@ TEST_F(CUsbIoTest, SendsTheDriversRecords) {
     }
     const std::string block = " 04 03 02 01 02 00 00 00 0D 0C 0B 0A 55 C0 34 12 78 56";
     EXPECT_THAT(
-        driver.TakeTranscript(),
+        driver_.TakeTranscript(),
         ElementsAre(
             "control 80942028 /",
             "control 80942024 02 01 02 00 00 00 01 00 00 00 01 00 03 02 05 04 09 08 07 06" + unused + " /",
@@ -199,7 +199,7 @@ TEST_F(CUsbIoTest, SendsTheDriversRecords) {
 
     const std::array<InterfaceSetting, ConfigurationBlock::MaximumEntries + 1> tooMany{};
     EXPECT_EQ(device.SetConfiguration({0, tooMany}), Status::InvalidFunctionParameter);
-    EXPECT_THAT(driver.TakeTranscript(), IsEmpty());
+    EXPECT_THAT(driver_.TakeTranscript(), IsEmpty());
 }
 
 TEST_F(CUsbIoTest, ControlsReportHowTheyEnd) {
@@ -219,7 +219,7 @@ TEST_F(CUsbIoTest, ControlsReportHowTheyEnd) {
     CUsbIo device;
     ASSERT_EQ(Open(device), Status::Success);
     for (const auto& row : cases) {
-        driver.Script(Control::ClassOrVendorInRequest, row.answer);
+        driver_.Script(Control::ClassOrVendorInRequest, row.answer);
         std::array<std::uint8_t, 4> data{};
         std::uint32_t length = data.size();
         EXPECT_EQ(device.ClassOrVendorInRequest(data.data(), length, {}), row.status) << row.name;
@@ -232,7 +232,7 @@ TEST_F(CUsbIoTest, ControlsOfSeveralThreadsRunOneAtATime) {
     ASSERT_EQ(Open(device), Status::Success);
     constexpr int Each = 5;
     for (int i = 0; i < 2 * Each; ++i) {
-        driver.Script(Control::UnconfigureDevice, {.after = 2});
+        driver_.Script(Control::UnconfigureDevice, {.after = 2});
     }
     const auto work = [&] {
         for (int i = 0; i < Each; ++i) {
@@ -243,7 +243,7 @@ TEST_F(CUsbIoTest, ControlsOfSeveralThreadsRunOneAtATime) {
         const Tests::BackgroundThread other(work);
         work();
     }
-    EXPECT_EQ(driver.MostControlsAtOnce(), 1U);
+    EXPECT_EQ(driver_.MostControlsAtOnce(), 1U);
 }
 
 }  // namespace

@@ -24,14 +24,14 @@ constexpr std::uint32_t Limit = 10000;
 /// Collects what it reads; tells when its thread is through.
 class Reader final : public CUsbIoReader {
   public:
-    bool WaitForExit() { return Platform::Wait(exited.Get(), Limit) == Platform::WaitResult::Signalled; }
+    bool WaitForExit() { return Platform::Wait(exited_.Get(), Limit) == Platform::WaitResult::Signalled; }
     std::vector<std::uint8_t> Received() {
-        const std::lock_guard held(lock);
-        return received;
+        const std::lock_guard held(lock_);
+        return received_;
     }
     std::vector<std::uint32_t> Errors() {
-        const std::lock_guard held(lock);
-        return errors;
+        const std::lock_guard held(lock_);
+        return errors_;
     }
     std::uint32_t FreeBufferCount() { return BufferPool.CurrentCount(); }
 
@@ -46,9 +46,9 @@ class Reader final : public CUsbIoReader {
     }
     void OnBufferCompleted(CUsbIoBuffer& buffer) override {
         {
-            const std::lock_guard held(lock);
+            const std::lock_guard held(lock_);
             const auto* const bytes = static_cast<const std::uint8_t*>(buffer.Buffer);
-            received.insert(received.end(), bytes, bytes + buffer.BytesTransferred);
+            received_.insert(received_.end(), bytes, bytes + buffer.BytesTransferred);
             EXPECT_TRUE(std::all_of(bytes + buffer.BytesTransferred, bytes + buffer.Size,
                                     [](std::uint8_t byte) { return byte == 0; }));
         }
@@ -57,47 +57,47 @@ class Reader final : public CUsbIoReader {
         }
     }
     void OnBufferError(CUsbIoBuffer& buffer) override {
-        const std::lock_guard held(lock);
-        errors.push_back(buffer.Status);
+        const std::lock_guard held(lock_);
+        errors_.push_back(buffer.Status);
     }
-    void OnThreadExit() override { Platform::SignalEvent(exited.Get()); }
+    void OnThreadExit() override { Platform::SignalEvent(exited_.Get()); }
 
-    Platform::OwnedHandle exited{Platform::MakeAutoResetEvent()};
-    std::mutex lock;
-    std::vector<std::uint8_t> received;
-    std::vector<std::uint32_t> errors;
+    Platform::OwnedHandle exited_{Platform::MakeAutoResetEvent()};
+    std::mutex lock_;
+    std::vector<std::uint8_t> received_;
+    std::vector<std::uint32_t> errors_;
 };
 
 /// Sends the numbers from 1 on, one for each buffer.
 class Writer final : public CUsbIoWriter {
   public:
-    bool WaitForExit() { return Platform::Wait(exited.Get(), Limit) == Platform::WaitResult::Signalled; }
+    bool WaitForExit() { return Platform::Wait(exited_.Get(), Limit) == Platform::WaitResult::Signalled; }
 
     std::uint8_t writesWanted = 0;
     std::atomic<int> completed = 0;
     std::vector<std::uint32_t> Errors() {
-        const std::lock_guard held(lock);
-        return errors;
+        const std::lock_guard held(lock_);
+        return errors_;
     }
 
   private:
     void PrepareBuffer(CUsbIoBuffer& buffer) override {
         CUsbIoWriter::PrepareBuffer(buffer);
         buffer.NumberOfBytesToTransfer = 1;
-        buffer.OperationFinished = sent == writesWanted;
-        *static_cast<std::uint8_t*>(buffer.Buffer) = ++sent;
+        buffer.OperationFinished = sent_ == writesWanted;
+        *static_cast<std::uint8_t*>(buffer.Buffer) = ++sent_;
     }
     void OnBufferCompleted(CUsbIoBuffer&) override { ++completed; }
     void OnBufferError(CUsbIoBuffer& buffer) override {
-        const std::lock_guard held(lock);
-        errors.push_back(buffer.Status);
+        const std::lock_guard held(lock_);
+        errors_.push_back(buffer.Status);
     }
-    void OnThreadExit() override { Platform::SignalEvent(exited.Get()); }
+    void OnThreadExit() override { Platform::SignalEvent(exited_.Get()); }
 
-    Platform::OwnedHandle exited{Platform::MakeAutoResetEvent()};
-    std::mutex lock;
-    std::vector<std::uint32_t> errors;
-    std::uint8_t sent = 0;
+    Platform::OwnedHandle exited_{Platform::MakeAutoResetEvent()};
+    std::mutex lock_;
+    std::vector<std::uint32_t> errors_;
+    std::uint8_t sent_ = 0;
 };
 
 class CUsbIoThreadTest : public Tests::DriverTest {
@@ -106,7 +106,7 @@ class CUsbIoThreadTest : public Tests::DriverTest {
     void Bind(Stream& stream, std::uint8_t endpoint) {
         const ScopedDeviceList list(InterfaceClass);
         ASSERT_EQ(stream.Bind(0, endpoint, list.Get(), &InterfaceClass), Status::Success);
-        driver.TakeTranscript();
+        driver_.TakeTranscript();
     }
 };
 
@@ -115,7 +115,7 @@ TEST_F(CUsbIoThreadTest, ReadsAStreamInOrder) {
     Bind(reader, BulkInEndpoint);
     std::vector<std::uint8_t> expected;
     for (std::uint8_t i = 0; i < 10; ++i) {
-        driver.Script(BulkInEndpoint, {.data = {i, 0x80}, .after = i % 3U * 2U});
+        driver_.Script(BulkInEndpoint, {.data = {i, 0x80}, .after = i % 3U * 2U});
         expected.insert(expected.end(), {i, 0x80});
     }
     reader.readsWanted = 10;
@@ -131,18 +131,18 @@ TEST_F(CUsbIoThreadTest, ReadsAStreamInOrder) {
 TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
     Reader reader;
     Bind(reader, BulkInEndpoint);
-    driver.Script(BulkInEndpoint, {.data = {1}, .after = 1});
+    driver_.Script(BulkInEndpoint, {.data = {1}, .after = 1});
     ASSERT_TRUE(reader.AllocateBuffers(8, 4));
     const Platform::OwnedHandle completed(Platform::MakeAutoResetEvent());
     reader.onCompleted = [&] { Platform::SignalEvent(completed.Get()); };
     ASSERT_TRUE(reader.StartThread());
     ASSERT_EQ(Platform::Wait(completed.Get(), Limit), Platform::WaitResult::Signalled);
-    WaitUntil([&] { return driver.Running(BulkInEndpoint) == 4; });
+    WaitUntil([&] { return driver_.Running(BulkInEndpoint) == 4; });
     reader.onCompleted = {};
-    const Tests::Stopwatch stopwatch(clock);
+    const Tests::Stopwatch stopwatch(clock_);
     EXPECT_TRUE(reader.ShutdownThread());
     stopwatch.ExpectAtMost(0);
-    EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+    EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
     EXPECT_EQ(reader.FreeBufferCount(), 4U);
     EXPECT_TRUE(reader.ShutdownThread());
 }
@@ -168,15 +168,15 @@ TEST_F(CUsbIoThreadTest, EndsAfterTooManyErrorsInARow) {
         SCOPED_TRACE(row.name);
         Bind(stream, endpoint);
         for (const std::uint32_t status : row.statuses) {
-            driver.Script(endpoint, {.code = status, .after = 1});
+            driver_.Script(endpoint, {.code = status, .after = 1});
         }
-        driver.Script(endpoint, {.code = Bad});
+        driver_.Script(endpoint, {.code = Bad});
         ASSERT_TRUE(stream.AllocateBuffers(8, 1));
         ASSERT_TRUE(row.most ? stream.StartThread(*row.most) : stream.StartThread());
         EXPECT_TRUE(stream.WaitForExit());
         EXPECT_EQ(stream.Errors(), row.errors);
         EXPECT_TRUE(stream.ShutdownThread());
-        driver.DropScript(endpoint);
+        driver_.DropScript(endpoint);
     };
     for (const Case& row : cases) {
         Reader reader;
@@ -192,24 +192,24 @@ TEST_F(CUsbIoThreadTest, AReadStartedBehindTheAbortDoesNotHoldUpTheEnd) {
     Bind(reader, BulkInEndpoint);
     const Platform::OwnedHandle started(Platform::MakeAutoResetEvent());
     const Platform::OwnedHandle aborted(Platform::MakeAutoResetEvent());
-    driver.Script(BulkInEndpoint, {.after = Never, .onStart = [&] {
-                                       Platform::SignalEvent(started.Get());
-                                       Platform::Wait(aborted.Get(), Limit);
-                                       Platform::SleepMilliseconds(20);
-                                   }});
-    driver.Script(Control::AbortPipe, {.onStart = [&] { Platform::SignalEvent(aborted.Get()); }});
+    driver_.Script(BulkInEndpoint, {.after = Never, .onStart = [&] {
+                                        Platform::SignalEvent(started.Get());
+                                        Platform::Wait(aborted.Get(), Limit);
+                                        Platform::SleepMilliseconds(20);
+                                    }});
+    driver_.Script(Control::AbortPipe, {.onStart = [&] { Platform::SignalEvent(aborted.Get()); }});
     ASSERT_TRUE(reader.AllocateBuffers(8, 2));
     ASSERT_TRUE(reader.StartThread());
     ASSERT_EQ(Platform::Wait(started.Get(), Limit), Platform::WaitResult::Signalled);
     EXPECT_TRUE(reader.ShutdownThread());
-    EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+    EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
     EXPECT_EQ(reader.FreeBufferCount(), 2U);
 }
 
 TEST_F(CUsbIoThreadTest, TheThreadItselfCanAskForItsEnd) {
     Reader reader;
     Bind(reader, BulkInEndpoint);
-    driver.Script(BulkInEndpoint, {.data = {1}, .after = 1});
+    driver_.Script(BulkInEndpoint, {.data = {1}, .after = 1});
     bool answer = true;
     reader.onCompleted = [&] { answer = reader.ShutdownThread(); };
     ASSERT_TRUE(reader.AllocateBuffers(8, 1));
@@ -222,11 +222,11 @@ TEST_F(CUsbIoThreadTest, TheThreadItselfCanAskForItsEnd) {
 TEST_F(CUsbIoThreadTest, SomethingThrownEndsTheThread) {
     Reader reader;
     Bind(reader, BulkInEndpoint);
-    driver.Script(BulkInEndpoint, {.data = {1}, .after = 1});
+    driver_.Script(BulkInEndpoint, {.data = {1}, .after = 1});
     reader.onCompleted = [] { throw 7; };
     ASSERT_TRUE(reader.AllocateBuffers(8, 3));
     ASSERT_TRUE(reader.StartThread());
-    WaitUntil([&] { return !reader.Received().empty() && driver.Running(BulkInEndpoint) == 0; });
+    WaitUntil([&] { return !reader.Received().empty() && driver_.Running(BulkInEndpoint) == 0; });
     EXPECT_TRUE(reader.ShutdownThread());
     EXPECT_EQ(reader.FreeBufferCount(), 3U) << "also the one that was at hand";
 }
@@ -237,16 +237,16 @@ TEST_F(CUsbIoThreadTest, WritesUntilFinished) {
         Writer writer;
         Bind(writer, BulkOutEndpoint);
         for (int i = 0; i < count; ++i) {
-            driver.Script(BulkOutEndpoint, {.after = 2});
+            driver_.Script(BulkOutEndpoint, {.after = 2});
         }
         writer.writesWanted = count;
         ASSERT_TRUE(writer.AllocateBuffers(2, 3));
         ASSERT_TRUE(writer.StartThread());
         EXPECT_TRUE(writer.WaitForExit());
-        EXPECT_EQ(driver.TakeTranscript(), Lines(all.begin(), all.begin() + count));
+        EXPECT_EQ(driver_.TakeTranscript(), Lines(all.begin(), all.begin() + count));
         EXPECT_TRUE(writer.ShutdownThread());
         EXPECT_EQ(writer.completed, 0);
-        EXPECT_EQ(driver.Running(BulkOutEndpoint), 0U);
+        EXPECT_EQ(driver_.Running(BulkOutEndpoint), 0U);
     }
 }
 

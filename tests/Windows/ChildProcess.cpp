@@ -32,7 +32,7 @@ ChildProcess::ChildProcess(const std::string& task, const std::string& argument)
     : ChildProcess(Program{'"' + ThisProgram() + "\" \"" + ShippedLibrary::path + "\" " + task + " \"" +
                            argument + '"'}) {}
 
-ChildProcess::ChildProcess(Program program) : ready(CreateEventA(nullptr, FALSE, FALSE, ReadyEvent)) {
+ChildProcess::ChildProcess(Program program) : ready_(CreateEventA(nullptr, FALSE, FALSE, ReadyEvent)) {
     STARTUPINFOA startup{};
     startup.cb = sizeof startup;
     SECURITY_ATTRIBUTES inherited{sizeof inherited, nullptr, TRUE};
@@ -45,25 +45,25 @@ ChildProcess::ChildProcess(Program program) : ready(CreateEventA(nullptr, FALSE,
         startup.hStdError = file;
     }
     CreateProcessA(nullptr, program.commandLine.data(), nullptr, nullptr, file != nullptr, 0, nullptr,
-                   nullptr, &startup, &process);
+                   nullptr, &startup, &process_);
     CloseHandle(file);
 }
 
 ChildProcess::~ChildProcess() {
-    WaitForSingleObject(process.hProcess, 20'000);
-    CloseHandle(process.hThread);
-    CloseHandle(process.hProcess);
-    CloseHandle(ready);
+    WaitForSingleObject(process_.hProcess, 20'000);
+    CloseHandle(process_.hThread);
+    CloseHandle(process_.hProcess);
+    CloseHandle(ready_);
 }
 
 bool ChildProcess::IsReady() {
-    return WaitForSingleObject(ready, 10'000) == WAIT_OBJECT_0;
+    return WaitForSingleObject(ready_, 10'000) == WAIT_OBJECT_0;
 }
 
 DWORD ChildProcess::Wait() {
     DWORD code = STILL_ACTIVE;
-    WaitForSingleObject(process.hProcess, 20'000);
-    GetExitCodeProcess(process.hProcess, &code);
+    WaitForSingleObject(process_.hProcess, 20'000);
+    GetExitCodeProcess(process_.hProcess, &code);
     return code;
 }
 

@@ -32,8 +32,8 @@ class ChildProcess final {
     DWORD Wait();
 
   private:
-    HANDLE ready;
-    PROCESS_INFORMATION process{};
+    HANDLE ready_;
+    PROCESS_INFORMATION process_{};
 };
 
 /// The child's side: its exit code.

@@ -10,9 +10,9 @@ ShippedLibrary::ShippedLibrary() : module(LoadLibraryA(path.c_str())) {
     if (module == nullptr) {
         throw std::runtime_error(path + " does not load: error " + std::to_string(GetLastError()));
     }
-    writeImage = Platform::FindEntryPoint<decltype(f3355d91d5df0e0b)>(module, "f3355d91d5df0e0b");
-    takeReadout = Platform::FindEntryPoint<decltype(d4fb86cecc88582a)>(module, "d4fb86cecc88582a");
-    getInformation = Platform::FindEntryPoint<decltype(b5ae189db26b2a1b)>(module, "b5ae189db26b2a1b");
+    writeImage_ = Platform::FindEntryPoint<decltype(f3355d91d5df0e0b)>(module, "f3355d91d5df0e0b");
+    takeReadout_ = Platform::FindEntryPoint<decltype(d4fb86cecc88582a)>(module, "d4fb86cecc88582a");
+    getInformation_ = Platform::FindEntryPoint<decltype(b5ae189db26b2a1b)>(module, "b5ae189db26b2a1b");
 }
 
 }  // namespace Varnholt::Tests

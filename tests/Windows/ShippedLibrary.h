@@ -22,12 +22,12 @@ class ShippedLibrary final {
     ShippedLibrary& operator=(const ShippedLibrary&) = delete;
 
     std::int32_t WriteImage(const std::vector<std::uint8_t>& image, const std::string& instrument) {
-        return writeImage(image.data(), instrument.c_str());
+        return writeImage_(image.data(), instrument.c_str());
     }
     std::int32_t TakeReadout(const std::string& instrument) {
-        return takeReadout(values.data(), instrument.c_str());
+        return takeReadout_(values.data(), instrument.c_str());
     }
-    std::string LastError() { return getInformation("LastError"); }
+    std::string LastError() { return getInformation_("LastError"); }
 
     /// What the last successful readout has stored.
     std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
@@ -35,9 +35,9 @@ class ShippedLibrary final {
     HMODULE module;
 
   private:
-    decltype(&f3355d91d5df0e0b) writeImage;
-    decltype(&d4fb86cecc88582a) takeReadout;
-    decltype(&b5ae189db26b2a1b) getInformation;
+    decltype(&f3355d91d5df0e0b) writeImage_;
+    decltype(&d4fb86cecc88582a) takeReadout_;
+    decltype(&b5ae189db26b2a1b) getInformation_;
 };
 
 }  // namespace Varnholt::Tests

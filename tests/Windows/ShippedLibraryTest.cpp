@@ -41,8 +41,8 @@ std::vector<std::uint8_t> MakeImage(std::uint8_t seed) {
 /// beginning.
 class HandleBalance final {
   public:
-    HandleBalance() : before(Count()) {}
-    ~HandleBalance() { EXPECT_EQ(Count(), before) << "handles of the process"; }
+    HandleBalance() : before_(Count()) {}
+    ~HandleBalance() { EXPECT_EQ(Count(), before_) << "handles of the process"; }
     HandleBalance(const HandleBalance&) = delete;
     HandleBalance& operator=(const HandleBalance&) = delete;
 
@@ -52,7 +52,7 @@ class HandleBalance final {
         GetProcessHandleCount(GetCurrentProcess(), &count);
         return count;
     }
-    const DWORD before;
+    const DWORD before_;
 };
 
 /// The library and the driver are loaded once; every test begins without an instrument.

@@ -67,22 +67,22 @@ void WriteDeviceKey(const std::string& name) {
 }  // namespace
 
 StandInDriver::StandInDriver(const std::string& image) {
-    manager = OpenSCManagerA(nullptr, nullptr, SC_MANAGER_ALL_ACCESS);
-    Check(manager != nullptr, "service manager");
-    service = CreateServiceA(manager, ServiceName, ServiceName, SERVICE_ALL_ACCESS, SERVICE_KERNEL_DRIVER,
-                             SERVICE_DEMAND_START, SERVICE_ERROR_NORMAL, image.c_str(), nullptr, nullptr,
-                             nullptr, nullptr, nullptr);
-    Check(service != nullptr, "service");
-    Check(StartServiceA(service, 0, nullptr) != 0, "start of the driver");
+    manager_ = OpenSCManagerA(nullptr, nullptr, SC_MANAGER_ALL_ACCESS);
+    Check(manager_ != nullptr, "service manager");
+    service_ = CreateServiceA(manager_, ServiceName, ServiceName, SERVICE_ALL_ACCESS, SERVICE_KERNEL_DRIVER,
+                              SERVICE_DEMAND_START, SERVICE_ERROR_NORMAL, image.c_str(), nullptr, nullptr,
+                              nullptr, nullptr, nullptr);
+    Check(service_ != nullptr, "service");
+    Check(StartServiceA(service_, 0, nullptr) != 0, "start of the driver");
 }
 
 StandInDriver::~StandInDriver() {
     UnplugAll();
     SERVICE_STATUS status{};
-    ControlService(service, SERVICE_CONTROL_STOP, &status);
-    DeleteService(service);
-    CloseServiceHandle(service);
-    CloseServiceHandle(manager);
+    ControlService(service_, SERVICE_CONTROL_STOP, &status);
+    DeleteService(service_);
+    CloseServiceHandle(service_);
+    CloseServiceHandle(manager_);
 }
 
 bool StandInDriver::HostIs64Bit() {
@@ -93,12 +93,12 @@ bool StandInDriver::HostIs64Bit() {
 
 void StandInDriver::Enumerate() {
     SERVICE_STATUS status{};
-    Check(ControlService(service, EnumerateRootDevices, &status) != 0, "enumeration");
+    Check(ControlService(service_, EnumerateRootDevices, &status) != 0, "enumeration");
 }
 
 std::string StandInDriver::PlugIn() {
     char name[8];
-    std::snprintf(name, sizeof name, "%04u", nextDevice++ % 10'000);
+    std::snprintf(name, sizeof name, "%04u", nextDevice_++ % 10'000);
     WriteDeviceKey(name);
     Enumerate();
     const std::string part = std::string("#ostra#") + name + "#";
@@ -114,30 +114,30 @@ std::string StandInDriver::PlugIn() {
         },
         "instrument to be listed");
     // The driver counts its instruments in the order of their arrival.
-    plugged.push_back({path, name, nextDevice});
+    plugged_.push_back({path, name, nextDevice_});
     return path;
 }
 
 void StandInDriver::Unplug(const std::string& path) {
-    const auto found = std::ranges::find(plugged, path, &Device::path);
-    if (found == plugged.end()) {
+    const auto found = std::ranges::find(plugged_, path, &Device::path);
+    if (found == plugged_.end()) {
         return;
     }
     DeleteTree(HKEY_LOCAL_MACHINE, (std::string(DeviceKeys) + "\\" + found->key).c_str());
-    plugged.erase(found);
+    plugged_.erase(found);
     Enumerate();
     WaitUntil([&] { return std::ranges::count(List(), path) == 0; }, "instrument to be gone");
 }
 
 void StandInDriver::UnplugAll() {
-    while (!plugged.empty()) {
-        Unplug(std::string(plugged.back().path));
+    while (!plugged_.empty()) {
+        Unplug(std::string(plugged_.back().path));
     }
 }
 
 std::uint64_t StandInDriver::SeedOf(const std::string& path) const {
-    const auto found = std::ranges::find(plugged, path, &Device::path);
-    return found == plugged.end() ? 0 : found->seed;
+    const auto found = std::ranges::find(plugged_, path, &Device::path);
+    return found == plugged_.end() ? 0 : found->seed;
 }
 
 std::vector<std::string> StandInDriver::List() {
@@ -162,15 +162,15 @@ std::vector<std::string> StandInDriver::List() {
 }
 
 Instrument::Instrument(const std::string& path)
-    : file(CreateFileA(path.c_str(), GENERIC_READ | GENERIC_WRITE, FILE_SHARE_READ | FILE_SHARE_WRITE,
-                       nullptr, OPEN_EXISTING, 0, nullptr)) {
-    Check(file != INVALID_HANDLE_VALUE, "instrument");  // NOLINT: the system's macro
+    : file_(CreateFileA(path.c_str(), GENERIC_READ | GENERIC_WRITE, FILE_SHARE_READ | FILE_SHARE_WRITE,
+                        nullptr, OPEN_EXISTING, 0, nullptr)) {
+    Check(file_ != INVALID_HANDLE_VALUE, "instrument");  // NOLINT: the system's macro
 }
 
 DWORD Instrument::Control(DWORD code, const void* input, std::size_t inputSize, void* output,
                           std::size_t outputSize) {
     DWORD moved = 0;
-    Check(DeviceIoControl(file, code, const_cast<void*>(input), static_cast<DWORD>(inputSize), output,
+    Check(DeviceIoControl(file_, code, const_cast<void*>(input), static_cast<DWORD>(inputSize), output,
                           static_cast<DWORD>(outputSize), &moved, nullptr) != 0,
           "test control");
     return moved;

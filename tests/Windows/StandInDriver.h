@@ -37,22 +37,22 @@ class StandInDriver final {
   private:
     void Enumerate();
 
-    SC_HANDLE manager = nullptr;
-    SC_HANDLE service = nullptr;
-    unsigned nextDevice = 0;
+    SC_HANDLE manager_ = nullptr;
+    SC_HANDLE service_ = nullptr;
+    unsigned nextDevice_ = 0;
     struct Device {
         std::string path;
         std::string key;  // name of its registry key
         std::uint64_t seed;
     };
-    std::vector<Device> plugged;
+    std::vector<Device> plugged_;
 };
 
 /// A handle of an instrument for what a test wants to do to it, past the library.
 class Instrument final {
   public:
     explicit Instrument(const std::string& path);
-    ~Instrument() { CloseHandle(file); }
+    ~Instrument() { CloseHandle(file_); }
     Instrument(const Instrument&) = delete;
     Instrument& operator=(const Instrument&) = delete;
 
@@ -68,7 +68,7 @@ class Instrument final {
     DWORD Control(DWORD code, const void* input = nullptr, std::size_t inputSize = 0, void* output = nullptr,
                   std::size_t outputSize = 0);
 
-    HANDLE file;
+    HANDLE file_;
 };
 
 }  // namespace Varnholt::Tests

@@ -31,7 +31,7 @@ struct Decision {
 /// called from any thread.
 class DriverFile {
   public:
-    explicit DriverFile(std::shared_ptr<SharedDevice> shared) : device(std::move(shared)) {}
+    explicit DriverFile(std::shared_ptr<SharedDevice> shared) : device_(std::move(shared)) {}
     virtual ~DriverFile() = default;
     DriverFile(const DriverFile&) = delete;
     DriverFile& operator=(const DriverFile&) = delete;
@@ -54,10 +54,10 @@ class DriverFile {
     virtual std::uint32_t TimeLimitOf(const Usb::Transfer& /*transfer*/) const { return 0; }
     virtual ErrorCode TimedOutCode() const { return Errors::SemaphoreTimeout; }
 
-    SharedDevice& Device() const { return *device; }
+    SharedDevice& Device() const { return *device_; }
 
   private:
-    const std::shared_ptr<SharedDevice> device;
+    const std::shared_ptr<SharedDevice> device_;
 };
 
 /// Ends what runs on an endpoint of a device, whichever file and thread started it.

@@ -71,7 +71,7 @@ Handle MakeHandle(std::uint32_t place, std::uint32_t generation) {
 
 class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller {
   public:
-    explicit DriverFileSystem(Usb::UsbBus& usbBus) : bus(usbBus) {}
+    explicit DriverFileSystem(Usb::UsbBus& usbBus) : bus_(usbBus) {}
     ~DriverFileSystem() override;
 
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
@@ -98,14 +98,14 @@ class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller
     bool Start(std::string_view call, Handle file, const Operation& operation, Overlapped& record);
     bool Close(OpenFile& open, std::uint32_t generation);
 
-    Usb::UsbBus& bus;
+    Usb::UsbBus& bus_;
     /// Guards the instruments and the occupation of places. It is held while devices are opened and closed,
     /// so that one which is being closed is not found in use by its own process. Taken before all other
     /// locks.
-    CriticalSection opening;
-    std::map<std::string, Instrument> instruments;
+    CriticalSection opening_;
+    std::map<std::string, Instrument> instruments_;
     /// A file once made stays in its place to the end, so that it can be looked up without a lock.
-    std::array<std::atomic<OpenFile*>, HandleLayout::Places> places{};
+    std::array<std::atomic<OpenFile*>, HandleLayout::Places> places_{};
 };
 
 std::uint32_t GenerationOf(Handle file) {
@@ -115,7 +115,7 @@ std::uint32_t GenerationOf(Handle file) {
 
 // Files that were left open are closed; nobody else is in here any more.
 DriverFileSystem::~DriverFileSystem() {
-    for (auto& place : places) {
+    for (auto& place : places_) {
         OpenFile* const file = place.load();
         if (file == nullptr) {
             break;
@@ -134,7 +134,7 @@ std::vector<std::string> DriverFileSystem::ListInterfaces(const Protocol::Guid& 
     } else {
         return {};
     }
-    std::vector<std::string> paths = bus.List();
+    std::vector<std::string> paths = bus_.List();
     for (std::string& path : paths) {
         path.insert(0, prefix);
     }
@@ -149,7 +149,7 @@ Handle DriverFileSystem::Open(const std::string& path) {
     try {
         const std::optional<DevicePath> parsed = Parse(path);
         if (parsed) {
-            const CriticalSection::Holder holder(opening);
+            const CriticalSection::Holder holder(opening_);
             OpenFile* const place = FreePlace();
             error = Errors::NoSystemResources;
             if (place != nullptr) {
@@ -169,15 +169,15 @@ Handle DriverFileSystem::Open(const std::string& path) {
 }
 
 std::unique_ptr<DriverFile> DriverFileSystem::OpenOnDevice(const DevicePath& path, ErrorCode& error) {
-    if (!bus.Has(path.name)) {
+    if (!bus_.Has(path.name)) {
         error = Errors::FileNotFound;
         return nullptr;
     }
-    Instrument& instrument = instruments[path.name];
+    Instrument& instrument = instruments_[path.name];
     std::shared_ptr<SharedDevice> device = instrument.device.lock();
     if (!device || device->IsGone()) {
         // A device that was unplugged stays gone for the files that are open on it; this is another one.
-        device = std::make_shared<SharedDevice>(bus, path.name);
+        device = std::make_shared<SharedDevice>(bus_, path.name);
         instrument = {device, {}};
     }
     if (!path.isUsbIo) {
@@ -192,11 +192,11 @@ std::unique_ptr<DriverFile> DriverFileSystem::OpenOnDevice(const DevicePath& pat
 }
 
 OpenFile* DriverFileSystem::FreePlace() {
-    for (std::uint32_t index = 0; index < places.size(); ++index) {
-        OpenFile* file = places[index].load(std::memory_order_relaxed);
+    for (std::uint32_t index = 0; index < places_.size(); ++index) {
+        OpenFile* file = places_[index].load(std::memory_order_relaxed);
         if (file == nullptr) {
             file = new OpenFile(index);
-            places[index].store(file, std::memory_order_release);
+            places_[index].store(file, std::memory_order_release);
         }
         if (file->IsFree()) {
             return file;
@@ -211,7 +211,7 @@ OpenFile* DriverFileSystem::Find(Handle file) const {
     if ((value & Fixed) != HandleLayout::Mark) {
         return nullptr;
     }
-    return places[value >> HandleLayout::PlaceShift & (HandleLayout::Places - 1)].load(
+    return places_[value >> HandleLayout::PlaceShift & (HandleLayout::Places - 1)].load(
         std::memory_order_acquire);
 }
 
@@ -232,10 +232,10 @@ bool DriverFileSystem::Close(OpenFile& open, std::uint32_t generation) {
     if (!driver) {
         return false;
     }
-    const CriticalSection::Holder holder(opening);
+    const CriticalSection::Holder holder(opening_);
     driver.reset();
     open.Free();
-    std::erase_if(instruments, [](const auto& entry) { return entry.second.device.expired(); });
+    std::erase_if(instruments_, [](const auto& entry) { return entry.second.device.expired(); });
     return true;
 }
 
@@ -309,7 +309,7 @@ bool DriverFileSystem::CancelTransfers(Handle file) {
 }
 
 void DriverFileSystem::CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) {
-    for (const auto& place : places) {
+    for (const auto& place : places_) {
         OpenFile* const file = place.load(std::memory_order_acquire);
         if (file == nullptr) {
             return;

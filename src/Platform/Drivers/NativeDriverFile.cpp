@@ -64,9 +64,9 @@ std::unique_ptr<NativeDriverFile> NativeDriverFile::Open(std::shared_ptr<SharedD
         device.Unclaim();
         throw;
     }
-    if (file->endpoint != 0) {
+    if (file->endpoint_ != 0) {
         bool found = false;
-        error = device.FindEndpoint(file->endpoint, found);
+        error = device.FindEndpoint(file->endpoint_, found);
         if (error == Errors::Success && !found) {
             error = Errors::FileNotFound;
         }
@@ -76,31 +76,31 @@ std::unique_ptr<NativeDriverFile> NativeDriverFile::Open(std::shared_ptr<SharedD
 
 NativeDriverFile::NativeDriverFile(std::shared_ptr<SharedDevice> shared, std::uint8_t pipeEndpoint,
                                    EndpointCanceller& endpointCanceller)
-    : DriverFile(std::move(shared)), endpoint(pipeEndpoint), canceller(endpointCanceller) {}
+    : DriverFile(std::move(shared)), endpoint_(pipeEndpoint), canceller_(endpointCanceller) {}
 
 NativeDriverFile::~NativeDriverFile() {
     Device().Unclaim();
 }
 
 Decision NativeDriverFile::Read(Usb::Transfer& transfer) {
-    if (!IsInEndpoint(endpoint)) {
+    if (!IsInEndpoint(endpoint_)) {
         return Decision::Refuse(Errors::InvalidFunction);
     }
-    transfer.endpoint = endpoint;
+    transfer.endpoint = endpoint_;
     return transfer.length == 0 ? Decision::Done(0) : Decision::Send();
 }
 
 Decision NativeDriverFile::Write(Usb::Transfer& transfer) {
-    if (endpoint == 0 || IsInEndpoint(endpoint)) {
+    if (endpoint_ == 0 || IsInEndpoint(endpoint_)) {
         return Decision::Refuse(Errors::InvalidFunction);
     }
-    transfer.endpoint = endpoint;
+    transfer.endpoint = endpoint_;
     return Decision::Send();
 }
 
 Decision NativeDriverFile::Control(std::uint32_t code, std::span<const std::uint8_t> input,
                                    std::span<std::uint8_t> output, Usb::Transfer& transfer) {
-    if (endpoint != 0) {
+    if (endpoint_ != 0) {
         return Decision::Refuse(Errors::InvalidFunction);
     }
     const bool isKnown = code == Native::ControlVendorRequest || code == Native::ControlAbortPipe ||
@@ -123,7 +123,7 @@ Decision NativeDriverFile::Control(std::uint32_t code, std::span<const std::uint
         if (named != address || !found) {
             return Decision::Refuse(Errors::InvalidParameter);
         }
-        canceller.CancelEndpoint(Device(), address);
+        canceller_.CancelEndpoint(Device(), address);
         return Decision::Done(0);
     }
     const std::span<std::uint8_t> data =

@@ -39,8 +39,8 @@ class NativeDriverFile final : public DriverFile {
     NativeDriverFile(std::shared_ptr<SharedDevice> shared, std::uint8_t pipeEndpoint,
                      EndpointCanceller& endpointCanceller);
 
-    const std::uint8_t endpoint;  ///< 0: the device itself
-    EndpointCanceller& canceller;
+    const std::uint8_t endpoint_;  ///< 0: the device itself
+    EndpointCanceller& canceller_;
 };
 
 }  // namespace Varnholt::Platform::Drivers

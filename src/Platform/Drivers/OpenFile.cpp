@@ -44,41 +44,41 @@ void RunningRequest::TransferCompleted(Usb::Transfer&) noexcept {
 }
 
 OpenFile::~OpenFile() {
-    while (spare != nullptr) {
-        delete std::exchange(spare, spare->next);
+    while (spare_ != nullptr) {
+        delete std::exchange(spare_, spare_->next);
     }
 }
 
 std::uint32_t OpenFile::Open(std::unique_ptr<DriverFile> opened) {
-    const std::lock_guard guard(lock);
-    driver = std::move(opened);
-    use = Use::Open;
-    generation = (generation + 1) & ((1U << GenerationBits) - 1);
-    return generation;
+    const std::lock_guard guard(lock_);
+    driver_ = std::move(opened);
+    use_ = Use::Open;
+    generation_ = (generation_ + 1) & ((1U << GenerationBits) - 1);
+    return generation_;
 }
 
 std::uint32_t OpenFile::Generation() const {
-    const std::lock_guard guard(lock);
-    return generation;
+    const std::lock_guard guard(lock_);
+    return generation_;
 }
 
 bool OpenFile::IsFree() const {
-    const std::lock_guard guard(lock);
-    return use == Use::Free;
+    const std::lock_guard guard(lock_);
+    return use_ == Use::Free;
 }
 
 void OpenFile::Free() {
-    const std::lock_guard guard(lock);
-    use = Use::Free;
+    const std::lock_guard guard(lock_);
+    use_ = Use::Free;
 }
 
 std::unique_ptr<DriverFile> OpenFile::Close(std::uint32_t openedAs) {
     {
-        const std::lock_guard guard(lock);
-        if (use != Use::Open || generation != openedAs) {
+        const std::lock_guard guard(lock_);
+        if (use_ != Use::Open || generation_ != openedAs) {
             return nullptr;
         }
-        use = Use::Closing;  // nothing starts from here on
+        use_ = Use::Closing;  // nothing starts from here on
     }
     Cancel([](const RunningRequest&) { return true; });
     AwaitIdle();
@@ -87,11 +87,11 @@ std::unique_ptr<DriverFile> OpenFile::Close(std::uint32_t openedAs) {
     OwnedHandle event;
     std::unique_ptr<DriverFile> closed;
     {
-        const std::lock_guard guard(lock);
-        use = Use::Closed;
-        closed = std::move(driver);
-        std::swap(unused, spare);
-        event = std::move(spareEvent);
+        const std::lock_guard guard(lock_);
+        use_ = Use::Closed;
+        closed = std::move(driver_);
+        std::swap(unused, spare_);
+        event = std::move(spareEvent_);
     }
     while (unused != nullptr) {
         delete std::exchange(unused, unused->next);
@@ -109,7 +109,7 @@ bool OpenFile::Start(std::uint32_t openedAs, const Operation& operation, Overlap
     if (request == nullptr) {
         return NotStarted(record, error);
     }
-    const Decision decision = Decide(*driver, operation, request->transfer);
+    const Decision decision = Decide(*driver_, operation, request->transfer);
     if (decision.kind == Decision::Kind::Refused) {
         Retire(*request);
         return NotStarted(record, decision.code);
@@ -122,9 +122,9 @@ bool OpenFile::Start(std::uint32_t openedAs, const Operation& operation, Overlap
         return true;
     }
     LimitTime(*request);
-    const ErrorCode refused = driver->Device().Submit(request->transfer);
+    const ErrorCode refused = driver_->Device().Submit(request->transfer);
     if (refused != Errors::Success) {
-        const ErrorCode code = driver->RefusalOf(refused);
+        const ErrorCode code = driver_->RefusalOf(refused);
         Retire(*request);
         return NotStarted(record, code);
     }
@@ -149,14 +149,14 @@ bool OpenFile::Start(std::uint32_t openedAs, const Operation& operation, Overlap
 }
 
 RunningRequest* OpenFile::Begin(std::uint32_t openedAs, Overlapped& record, ErrorCode& error) {
-    const std::lock_guard guard(lock);
-    if (use != Use::Open || generation != openedAs) {
+    const std::lock_guard guard(lock_);
+    if (use_ != Use::Open || generation_ != openedAs) {
         error = Errors::InvalidHandle;
         return nullptr;
     }
-    RunningRequest* request = spare;
+    RunningRequest* request = spare_;
     if (request != nullptr) {
-        spare = request->next;
+        spare_ = request->next;
     } else {
         request = new (std::nothrow) RunningRequest(*this);
         if (request == nullptr) {
@@ -169,20 +169,20 @@ RunningRequest* OpenFile::Begin(std::uint32_t openedAs, Overlapped& record, Erro
     request->state.store(0, std::memory_order_relaxed);
     request->endpoint.store(RunningRequest::Undecided, std::memory_order_relaxed);
     request->waitLimit.store(0, std::memory_order_relaxed);
-    request->number = ++lastNumber;
+    request->number = ++lastNumber_;
     request->ended = false;
     request->previous = nullptr;
-    request->next = running;
-    if (running != nullptr) {
-        running->previous = request;
+    request->next = running_;
+    if (running_ != nullptr) {
+        running_->previous = request;
     }
-    running = request;
+    running_ = request;
     return request;
 }
 
 /// Before the transfer is submitted. A control is waited for here, anything else wherever its starter likes.
 void OpenFile::LimitTime(RunningRequest& request) {
-    const std::uint32_t limit = driver->TimeLimitOf(request.transfer);
+    const std::uint32_t limit = driver_->TimeLimitOf(request.transfer);
     if (limit == 0) {
         return;
     }
@@ -207,14 +207,14 @@ void OpenFile::GiveUp(std::uint64_t number) {
 /// The starter's part of a cancellation that came before the device had the transfer.
 void OpenFile::CancelAfterSubmit(RunningRequest& request) {
     {
-        const std::lock_guard guard(lock);
+        const std::lock_guard guard(lock_);
         Pin(request);
     }
     const std::uint32_t before = request.state.fetch_or(RunningRequest::Submitted, std::memory_order_acq_rel);
     if ((before & RunningRequest::Completed) != 0) {
         Finish(request);
     } else {
-        driver->Device().Cancel(request.transfer);
+        driver_->Device().Cancel(request.transfer);
     }
     Unpin(request);
 }
@@ -225,10 +225,10 @@ void OpenFile::Ended(RunningRequest& request) {
 
 ErrorCode OpenFile::Finish(RunningRequest& request) {
     const Usb::Transfer& transfer = request.transfer;
-    driver->Device().Learn(transfer);
+    driver_->Device().Learn(transfer);
     const bool timedOut = transfer.status == Usb::TransferStatus::Cancelled &&
                           (request.state.load(std::memory_order_relaxed) & RunningRequest::TimedOut) != 0;
-    const ErrorCode code = timedOut ? driver->TimedOutCode() : driver->OutcomeOf(transfer.status);
+    const ErrorCode code = timedOut ? driver_->TimedOutCode() : driver_->OutcomeOf(transfer.status);
     const std::uint32_t moved =
         transfer.actualLength < transfer.length ? transfer.actualLength : transfer.length;
     // The record first: `Close` lets go of the caller's memory as soon as the request is off the list.
@@ -243,8 +243,8 @@ void OpenFile::Retire(RunningRequest& request) {
     }
     Waiter* released = nullptr;
     {
-        const std::lock_guard guard(lock);
-        (request.previous != nullptr ? request.previous->next : running) = request.next;
+        const std::lock_guard guard(lock_);
+        (request.previous != nullptr ? request.previous->next : running_) = request.next;
         if (request.next != nullptr) {
             request.next->previous = request.previous;
         }
@@ -252,34 +252,34 @@ void OpenFile::Retire(RunningRequest& request) {
         if (request.pins == 0) {
             Recycle(request);
         }
-        released = waiters != nullptr ? TakeReleased() : nullptr;
+        released = waiters_ != nullptr ? TakeReleased() : nullptr;
     }
     Waiter::Release(released);
 }
 
 void OpenFile::Recycle(RunningRequest& request) {
     request.record = nullptr;
-    request.next = spare;
-    spare = &request;
+    request.next = spare_;
+    spare_ = &request;
 }
 
 void OpenFile::Pin(RunningRequest& request) {
     if (request.pins++ == 0) {
-        ++pinned;
+        ++pinned_;
     }
 }
 
 void OpenFile::Unpin(RunningRequest& request) {
     Waiter* released = nullptr;
     {
-        const std::lock_guard guard(lock);
+        const std::lock_guard guard(lock_);
         if (--request.pins == 0) {
-            --pinned;
+            --pinned_;
             if (request.ended) {
                 Recycle(request);
             }
         }
-        released = waiters != nullptr ? TakeReleased() : nullptr;
+        released = waiters_ != nullptr ? TakeReleased() : nullptr;
     }
     Waiter::Release(released);
 }
@@ -295,9 +295,9 @@ void OpenFile::Cancel(Matches matches, std::uint32_t reason) {
     for (bool isFirst = true;; isFirst = false) {
         std::size_t count = 0;
         {
-            const std::lock_guard guard(lock);
-            newest = isFirst ? lastNumber : newest;
-            for (auto* request = running; request != nullptr && count < chosen.size();
+            const std::lock_guard guard(lock_);
+            newest = isFirst ? lastNumber_ : newest;
+            for (auto* request = running_; request != nullptr && count < chosen.size();
                  request = request->next) {
                 if (request->number > newest || !matches(*request)) {
                     continue;
@@ -314,7 +314,7 @@ void OpenFile::Cancel(Matches matches, std::uint32_t reason) {
         }
         for (std::size_t i = 0; i < count; ++i) {
             if (chosen[i].submitted) {
-                driver->Device().Cancel(chosen[i].request->transfer);
+                driver_->Device().Cancel(chosen[i].request->transfer);
             }
             Unpin(*chosen[i].request);
         }
@@ -323,8 +323,8 @@ void OpenFile::Cancel(Matches matches, std::uint32_t reason) {
 
 bool OpenFile::CancelOwn(std::uint32_t openedAs) {
     {
-        const std::lock_guard guard(lock);
-        if (use != Use::Open || generation != openedAs) {
+        const std::lock_guard guard(lock_);
+        if (use_ != Use::Open || generation_ != openedAs) {
             return false;
         }
     }
@@ -336,7 +336,7 @@ bool OpenFile::CancelOwn(std::uint32_t openedAs) {
 void OpenFile::CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) {
     // The file may be another's by now, hence the question at each request; where one runs there is a driver.
     Cancel([&device, endpoint, this](const RunningRequest& request) {
-        return request.endpoint.load(std::memory_order_relaxed) == endpoint && &driver->Device() == &device;
+        return request.endpoint.load(std::memory_order_relaxed) == endpoint && &driver_->Device() == &device;
     });
 }
 
@@ -346,8 +346,8 @@ bool OpenFile::WaitFor(std::uint32_t openedAs, const Overlapped& record) {
         Equip(waiter);
         bool enlisted = false;
         {
-            const std::lock_guard guard(lock);
-            const RunningRequest* request = generation == openedAs ? running : nullptr;
+            const std::lock_guard guard(lock_);
+            const RunningRequest* request = generation_ == openedAs ? running_ : nullptr;
             while (request != nullptr && request->record != &record) {
                 request = request->next;
             }
@@ -372,7 +372,7 @@ bool OpenFile::WaitFor(std::uint32_t openedAs, const Overlapped& record) {
 
 void OpenFile::AwaitIdle() {
     {
-        const std::lock_guard guard(lock);
+        const std::lock_guard guard(lock_);
         if (IsIdle()) {
             return;
         }
@@ -380,7 +380,7 @@ void OpenFile::AwaitIdle() {
     Waiter waiter;
     Equip(waiter);
     {
-        const std::lock_guard guard(lock);
+        const std::lock_guard guard(lock_);
         if (IsIdle()) {
             return;
         }
@@ -392,15 +392,15 @@ void OpenFile::AwaitIdle() {
 void OpenFile::Equip(Waiter& waiter) {
     OwnedHandle event;
     {
-        const std::lock_guard guard(lock);
-        std::swap(event, spareEvent);
+        const std::lock_guard guard(lock_);
+        std::swap(event, spareEvent_);
     }
     waiter.Equip(std::move(event));
 }
 
 void OpenFile::Enlist(Waiter& waiter) {
-    waiter.next = waiters;
-    waiters = &waiter;
+    waiter.next = waiters_;
+    waiters_ = &waiter;
 }
 
 void OpenFile::Await(Waiter& waiter) {
@@ -408,13 +408,13 @@ void OpenFile::Await(Waiter& waiter) {
         GiveUp(waiter.number);
     }
     OwnedHandle event = waiter.Await();
-    const std::lock_guard guard(lock);
-    std::swap(spareEvent, event);
+    const std::lock_guard guard(lock_);
+    std::swap(spareEvent_, event);
 }
 
 Waiter* OpenFile::TakeReleased() {
     Waiter* released = nullptr;
-    for (Waiter** link = &waiters; *link != nullptr;) {
+    for (Waiter** link = &waiters_; *link != nullptr;) {
         Waiter* const waiter = *link;
         if (waiter->request != nullptr ? waiter->request->ended : IsIdle()) {
             *link = waiter->next;

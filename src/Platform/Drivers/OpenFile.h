@@ -84,19 +84,19 @@ class OpenFile final {
     void Await(Waiter& waiter);
     void AwaitIdle();
     Waiter* TakeReleased();
-    bool IsIdle() const { return running == nullptr && pinned == 0; }
+    bool IsIdle() const { return running_ == nullptr && pinned_ == 0; }
 
-    mutable std::mutex lock;  ///< guards what follows; no other lock is taken while it is held
-    Use use = Use::Free;
-    std::uint32_t generation = 0;
+    mutable std::mutex lock_;  ///< guards what follows; no other lock is taken while it is held
+    Use use_ = Use::Free;
+    std::uint32_t generation_ = 0;
     /// Set and taken only while no request is on the list: a request on the list may use it without the lock.
-    std::unique_ptr<DriverFile> driver;
-    RunningRequest* running = nullptr;
-    RunningRequest* spare = nullptr;
-    std::uint32_t pinned = 0;  ///< requests with `pins`
-    std::uint64_t lastNumber = 0;
-    Waiter* waiters = nullptr;
-    OwnedHandle spareEvent;
+    std::unique_ptr<DriverFile> driver_;
+    RunningRequest* running_ = nullptr;
+    RunningRequest* spare_ = nullptr;
+    std::uint32_t pinned_ = 0;  ///< requests with `pins`
+    std::uint64_t lastNumber_ = 0;
+    Waiter* waiters_ = nullptr;
+    OwnedHandle spareEvent_;
 };
 
 }  // namespace Varnholt::Platform::Drivers

@@ -18,81 +18,81 @@ std::uint32_t BitOf(std::uint8_t endpoint) {
 }  // namespace
 
 SharedDevice::SharedDevice(Usb::UsbBus& usbBus, std::string nameOnBus)
-    : bus(usbBus), name(std::move(nameOnBus)) {}
+    : bus_(usbBus), name_(std::move(nameOnBus)) {}
 
 ErrorCode SharedDevice::Claim() {
-    const CriticalSection::Holder holder(setup);
-    if (claims == 0) {
-        if (!opened) {
+    const CriticalSection::Holder holder(setup_);
+    if (claims_ == 0) {
+        if (!opened_) {
             ErrorCode error = Errors::Success;
-            opened = bus.Open(name, error);
-            if (!opened) {
+            opened_ = bus_.Open(name_, error);
+            if (!opened_) {
                 return Note(error != Errors::Success ? error : Errors::GeneralFailure);
             }
-            usb.store(opened.get(), std::memory_order_release);
+            usb_.store(opened_.get(), std::memory_order_release);
         }
-        const ErrorCode code = Note(opened->Claim());
+        const ErrorCode code = Note(opened_->Claim());
         if (code != Errors::Success) {
             return code;
         }
     }
-    ++claims;
+    ++claims_;
     return Errors::Success;
 }
 
 void SharedDevice::Unclaim() {
-    const CriticalSection::Holder holder(setup);
-    if (claims > 0 && --claims == 0) {
+    const CriticalSection::Holder holder(setup_);
+    if (claims_ > 0 && --claims_ == 0) {
         ClearHalts();
-        opened->Release();
+        opened_->Release();
     }
 }
 
 bool SharedDevice::IsClaimed() {
-    const CriticalSection::Holder holder(setup);
-    return claims > 0;
+    const CriticalSection::Holder holder(setup_);
+    return claims_ > 0;
 }
 
 ErrorCode SharedDevice::FindEndpoint(std::uint8_t endpoint, bool& found) {
-    const CriticalSection::Holder holder(setup);
+    const CriticalSection::Holder holder(setup_);
     found = false;
-    if (!opened) {
+    if (!opened_) {
         return Errors::Success;
     }
     ErrorCode error = Errors::Success;
-    const auto endpoints = opened->Endpoints(error);
+    const auto endpoints = opened_->Endpoints(error);
     found = std::any_of(endpoints.begin(), endpoints.end(),
                         [endpoint](const Usb::EndpointInfo& info) { return info.address == endpoint; });
     return Note(error);
 }
 
 ErrorCode SharedDevice::Submit(Usb::Transfer& transfer) try {
-    if ((halted.load(std::memory_order_acquire) & BitOf(transfer.endpoint)) != 0) {
+    if ((halted_.load(std::memory_order_acquire) & BitOf(transfer.endpoint)) != 0) {
         const ErrorCode code = ClearHalt(transfer.endpoint);
         if (code != Errors::Success) {
             return code;
         }
     }
-    return Note(usb.load(std::memory_order_acquire)->Submit(transfer));
+    return Note(usb_.load(std::memory_order_acquire)->Submit(transfer));
 } catch (const std::bad_alloc&) {
     return Errors::NotEnoughMemory;
 }
 
 void SharedDevice::Cancel(Usb::Transfer& transfer) {
-    usb.load(std::memory_order_acquire)->Cancel(transfer);
+    usb_.load(std::memory_order_acquire)->Cancel(transfer);
 }
 
 void SharedDevice::Learn(const Usb::Transfer& transfer) {
     if (transfer.status == Usb::TransferStatus::Stalled && transfer.endpoint != 0) {
-        halted.fetch_or(BitOf(transfer.endpoint), std::memory_order_release);
+        halted_.fetch_or(BitOf(transfer.endpoint), std::memory_order_release);
     } else if (transfer.status == Usb::TransferStatus::DeviceGone) {
-        gone.store(true, std::memory_order_relaxed);
+        gone_.store(true, std::memory_order_relaxed);
     }
 }
 
 ErrorCode SharedDevice::ClearHalt(std::uint8_t endpoint) {
     // Whoever comes second must not pass before the first has cleared the halt, or its transfer stalls again.
-    const CriticalSection::Holder holder(setup);
+    const CriticalSection::Holder holder(setup_);
     return ClearHaltOf(endpoint);
 }
 
@@ -113,19 +113,19 @@ void SharedDevice::ClearHalts() noexcept {
 }
 
 ErrorCode SharedDevice::ClearHaltOf(std::uint8_t endpoint) {
-    if ((halted.load(std::memory_order_acquire) & BitOf(endpoint)) == 0) {
+    if ((halted_.load(std::memory_order_acquire) & BitOf(endpoint)) == 0) {
         return Errors::Success;
     }
-    const ErrorCode code = Note(opened->ClearHalt(endpoint));
+    const ErrorCode code = Note(opened_->ClearHalt(endpoint));
     if (code == Errors::Success) {
-        halted.fetch_and(~BitOf(endpoint), std::memory_order_release);
+        halted_.fetch_and(~BitOf(endpoint), std::memory_order_release);
     }
     return code;
 }
 
 ErrorCode SharedDevice::Note(ErrorCode code) {
     if (code == Errors::DeviceNotConnected) {
-        gone.store(true, std::memory_order_relaxed);
+        gone_.store(true, std::memory_order_relaxed);
     }
     return code;
 }

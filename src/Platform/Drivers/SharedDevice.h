@@ -34,7 +34,7 @@ class SharedDevice final {
     void Learn(const Usb::Transfer& transfer);
 
     /// Known to be unplugged; it does not come back, whatever is plugged in at its place.
-    bool IsGone() const { return gone.load(std::memory_order_relaxed); }
+    bool IsGone() const { return gone_.load(std::memory_order_relaxed); }
 
   private:
     ErrorCode ClearHalt(std::uint8_t endpoint);
@@ -43,15 +43,15 @@ class SharedDevice final {
     void ClearHalts() noexcept;
     ErrorCode Note(ErrorCode code);
 
-    Usb::UsbBus& bus;
-    const std::string name;
+    Usb::UsbBus& bus_;
+    const std::string name_;
 
-    CriticalSection setup;  ///< guards opening, the claim and the clearing of halts, all of which may block
-    std::uint32_t claims = 0;                ///< guarded by `setup`
-    std::shared_ptr<Usb::UsbDevice> opened;  ///< guarded by `setup`; once set, set for good
-    std::atomic<Usb::UsbDevice*> usb{nullptr};
-    std::atomic<std::uint32_t> halted{0};  ///< one bit for each endpoint that answered with STALL
-    std::atomic<bool> gone{false};
+    CriticalSection setup_;  ///< guards opening, the claim and the clearing of halts, all of which may block
+    std::uint32_t claims_ = 0;                ///< guarded by `setup`
+    std::shared_ptr<Usb::UsbDevice> opened_;  ///< guarded by `setup`; once set, set for good
+    std::atomic<Usb::UsbDevice*> usb_{nullptr};
+    std::atomic<std::uint32_t> halted_{0};  ///< one bit for each endpoint that answered with STALL
+    std::atomic<bool> gone_{false};
 };
 
 }  // namespace Varnholt::Platform::Drivers

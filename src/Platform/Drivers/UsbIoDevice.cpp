@@ -30,20 +30,20 @@ ErrorCode UsbIoRefusalOf(ErrorCode usbCode) {
     }
 }
 
-UsbIoDevice::UsbIoDevice(std::shared_ptr<SharedDevice> shared) : device(std::move(shared)) {}
+UsbIoDevice::UsbIoDevice(std::shared_ptr<SharedDevice> shared) : device_(std::move(shared)) {}
 
 UsbIoDevice::~UsbIoDevice() {
-    if (configured) {
-        device->Unclaim();
+    if (configured_) {
+        device_->Unclaim();
     }
 }
 
 ErrorCode UsbIoDevice::Configure(std::span<const std::uint8_t> block) {
-    const CriticalSection::Holder holder(lock);
-    if (device->IsGone()) {
+    const CriticalSection::Holder holder(lock_);
+    if (device_->IsGone()) {
         return Status::DeviceRemoved;
     }
-    if (configured) {
+    if (configured_) {
         return Status::AlreadyConfigured;
     }
     const std::uint8_t* const entry = block.data() + Block::FirstEntry;
@@ -56,78 +56,78 @@ ErrorCode UsbIoDevice::Configure(std::span<const std::uint8_t> block) {
         Protocol::LoadLittle16(entry + Block::EntryAlternateSetting) != 0) {
         return Status::InterfaceNotFound;
     }
-    const ErrorCode refused = device->Claim();
+    const ErrorCode refused = device_->Claim();
     if (refused != Errors::Success) {
         return UsbIoRefusalOf(refused);
     }
-    configured = true;
-    maximumTransfer.store(maximum, std::memory_order_relaxed);
+    configured_ = true;
+    maximumTransfer_.store(maximum, std::memory_order_relaxed);
     return Status::Success;
 }
 
 ErrorCode UsbIoDevice::Unconfigure() {
-    const CriticalSection::Holder holder(lock);
-    if (device->IsGone()) {
+    const CriticalSection::Holder holder(lock_);
+    if (device_->IsGone()) {
         return Status::DeviceRemoved;
     }
-    if (!bound.empty()) {
+    if (!bound_.empty()) {
         return Status::OpenPipes;
     }
-    if (configured) {
-        configured = false;
-        device->Unclaim();
+    if (configured_) {
+        configured_ = false;
+        device_->Unclaim();
     }
     return Status::Success;
 }
 
 ErrorCode UsbIoDevice::Bind(std::uint8_t endpoint, Binding& binding) {
-    const CriticalSection::Holder holder(lock);
-    if (device->IsGone()) {
+    const CriticalSection::Holder holder(lock_);
+    if (device_->IsGone()) {
         return Status::DeviceRemoved;
     }
-    if (!configured) {
+    if (!configured_) {
         return Status::NotConfigured;
     }
     if (binding != 0) {
         return Status::AlreadyBound;
     }
     bool found = false;
-    const ErrorCode unknown = device->FindEndpoint(endpoint, found);
+    const ErrorCode unknown = device_->FindEndpoint(endpoint, found);
     if (unknown != Errors::Success) {
         return UsbIoRefusalOf(unknown);
     }
     if (!found) {
         return Status::PipeNotFound;
     }
-    if (std::find(bound.begin(), bound.end(), endpoint) != bound.end()) {
+    if (std::find(bound_.begin(), bound_.end(), endpoint) != bound_.end()) {
         return Status::AlreadyBound;
     }
-    bound.push_back(endpoint);
+    bound_.push_back(endpoint);
     binding = endpoint;
     return Status::Success;
 }
 
 void UsbIoDevice::Unbind(Binding& binding) {
-    const CriticalSection::Holder holder(lock);
-    std::erase(bound, binding.load());
+    const CriticalSection::Holder holder(lock_);
+    std::erase(bound_, binding.load());
     binding = 0;
 }
 
 ErrorCode UsbIoDevice::ReadParameters(Parameters& target) {
-    const CriticalSection::Holder holder(lock);
-    if (device->IsGone()) {
+    const CriticalSection::Holder holder(lock_);
+    if (device_->IsGone()) {
         return Status::DeviceRemoved;
     }
-    target = parameters;
+    target = parameters_;
     return Status::Success;
 }
 
 ErrorCode UsbIoDevice::WriteParameters(const Parameters& source) {
-    const CriticalSection::Holder holder(lock);
-    if (device->IsGone()) {
+    const CriticalSection::Holder holder(lock_);
+    if (device_->IsGone()) {
         return Status::DeviceRemoved;
     }
-    parameters = source;
+    parameters_ = source;
     return Status::Success;
 }
 

@@ -43,18 +43,18 @@ class UsbIoDevice final {
     ErrorCode WriteParameters(const Parameters& source);
 
     /// Largest transfer of the configuration; it does not change while a pipe is bound.
-    std::uint32_t MaximumTransfer() const { return maximumTransfer.load(std::memory_order_relaxed); }
+    std::uint32_t MaximumTransfer() const { return maximumTransfer_.load(std::memory_order_relaxed); }
 
-    const std::shared_ptr<SharedDevice>& Shared() const { return device; }
+    const std::shared_ptr<SharedDevice>& Shared() const { return device_; }
 
   private:
-    const std::shared_ptr<SharedDevice> device;
+    const std::shared_ptr<SharedDevice> device_;
 
-    CriticalSection lock;  ///< guards what follows; taken before the locks of the shared device
-    bool configured = false;
-    std::vector<std::uint8_t> bound;
-    Parameters parameters{};
-    std::atomic<std::uint32_t> maximumTransfer{0};
+    CriticalSection lock_;  ///< guards what follows; taken before the locks of the shared device
+    bool configured_ = false;
+    std::vector<std::uint8_t> bound_;
+    Parameters parameters_{};
+    std::atomic<std::uint32_t> maximumTransfer_{0};
 };
 
 }  // namespace Varnholt::Platform::Drivers

@@ -63,11 +63,11 @@ Decision DriverInfo(std::span<std::uint8_t> output) {
 
 UsbIoDriverFile::UsbIoDriverFile(std::shared_ptr<UsbIoDevice> usbIoDevice,
                                  EndpointCanceller& endpointCanceller)
-    : DriverFile(usbIoDevice->Shared()), usbIo(std::move(usbIoDevice)), canceller(endpointCanceller) {}
+    : DriverFile(usbIoDevice->Shared()), usbIo_(std::move(usbIoDevice)), canceller_(endpointCanceller) {}
 
 UsbIoDriverFile::~UsbIoDriverFile() {
-    if (binding != 0) {
-        usbIo->Unbind(binding);
+    if (binding_ != 0) {
+        usbIo_->Unbind(binding_);
     }
 }
 
@@ -80,14 +80,14 @@ Decision UsbIoDriverFile::Write(Usb::Transfer& transfer) {
 }
 
 Decision UsbIoDriverFile::Move(Usb::Transfer& transfer, bool in) const {
-    transfer.endpoint = binding.load(std::memory_order_relaxed);
+    transfer.endpoint = binding_.load(std::memory_order_relaxed);
     if (transfer.endpoint == 0) {
         return Decision::Refuse(Status::NotBound);
     }
     if (transfer.IsIn() != in) {
         return Decision::Refuse(Status::InvalidDirection);
     }
-    if (transfer.length > usbIo->MaximumTransfer()) {
+    if (transfer.length > usbIo_->MaximumTransfer()) {
         return Decision::Refuse(Status::InvalidParameter);
     }
     return in && transfer.length == 0 ? Decision::Done(0) : Decision::Send();
@@ -103,12 +103,12 @@ Decision UsbIoDriverFile::Control(std::uint32_t code, std::span<const std::uint8
         case UsbIo::Control::GetDriverInfo:
             return DriverInfo(output);
         case UsbIo::Control::SetConfiguration:
-            return Answer(usbIo->Configure(input));
+            return Answer(usbIo_->Configure(input));
         case UsbIo::Control::UnconfigureDevice:
-            return Answer(usbIo->Unconfigure());
+            return Answer(usbIo_->Unconfigure());
         case UsbIo::Control::GetDeviceParameters: {
             UsbIoDevice::Parameters parameters{};
-            const ErrorCode status = usbIo->ReadParameters(parameters);
+            const ErrorCode status = usbIo_->ReadParameters(parameters);
             if (status == Status::Success) {
                 std::copy(parameters.begin(), parameters.end(), output.begin());
             }
@@ -117,10 +117,10 @@ Decision UsbIoDriverFile::Control(std::uint32_t code, std::span<const std::uint8
         case UsbIo::Control::SetDeviceParameters: {
             UsbIoDevice::Parameters parameters{};
             std::copy_n(input.begin(), parameters.size(), parameters.begin());
-            return Answer(usbIo->WriteParameters(parameters));
+            return Answer(usbIo_->WriteParameters(parameters));
         }
         case UsbIo::Control::BindPipe:
-            return Answer(usbIo->Bind(input[0], binding));
+            return Answer(usbIo_->Bind(input[0], binding_));
         case UsbIo::Control::AbortPipe:
             return AbortPipe();
         default:
@@ -163,11 +163,11 @@ Decision UsbIoDriverFile::AbortPipe() {
     if (Device().IsGone()) {
         return Decision::Refuse(Status::DeviceRemoved);
     }
-    const std::uint8_t endpoint = binding.load();
+    const std::uint8_t endpoint = binding_.load();
     if (endpoint == 0) {
         return Decision::Refuse(Status::NotBound);
     }
-    canceller.CancelEndpoint(Device(), endpoint);
+    canceller_.CancelEndpoint(Device(), endpoint);
     return Decision::Done(0);
 }
 

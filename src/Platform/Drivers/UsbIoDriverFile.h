@@ -40,9 +40,9 @@ class UsbIoDriverFile final : public DriverFile {
                            Usb::Transfer& transfer);
     Decision AbortPipe();
 
-    const std::shared_ptr<UsbIoDevice> usbIo;
-    EndpointCanceller& canceller;
-    UsbIoDevice::Binding binding{0};
+    const std::shared_ptr<UsbIoDevice> usbIo_;
+    EndpointCanceller& canceller_;
+    UsbIoDevice::Binding binding_{0};
 };
 
 }  // namespace Varnholt::Platform::Drivers

@@ -7,10 +7,10 @@
 namespace Varnholt::Platform::Drivers {
 
 void Waiter::Equip(OwnedHandle spare) noexcept {
-    event = std::move(spare);
+    event_ = std::move(spare);
     try {
-        if (!event) {
-            event = OwnedHandle(MakeAutoResetEvent());
+        if (!event_) {
+            event_ = OwnedHandle(MakeAutoResetEvent());
         }
     } catch (...) {
         // The wait must go on: a buffer is in use.
@@ -19,16 +19,16 @@ void Waiter::Equip(OwnedHandle spare) noexcept {
 
 bool Waiter::AwaitFor(std::uint32_t timeout) noexcept {
     try {
-        const WaitResult result = event ? Wait(event.Get(), timeout) : WaitResult::Failed;
-        signalled = result == WaitResult::Signalled;
+        const WaitResult result = event_ ? Wait(event_.Get(), timeout) : WaitResult::Failed;
+        signalled_ = result == WaitResult::Signalled;
         if (result != WaitResult::Failed) {
-            return signalled;
+            return signalled_;
         }
     } catch (...) {
         // As for an event that cannot be made.
     }
     std::uint32_t waited = 0;
-    while (!released.load(std::memory_order_acquire)) {
+    while (!released_.load(std::memory_order_acquire)) {
         if (timeout != Infinite && waited++ >= timeout) {
             return false;
         }
@@ -38,20 +38,20 @@ bool Waiter::AwaitFor(std::uint32_t timeout) noexcept {
 }
 
 OwnedHandle Waiter::Await() noexcept {
-    if (!signalled) {
+    if (!signalled_) {
         // One that has been released is about to be signalled.
         constexpr std::uint32_t Grace = 1000;
-        AwaitFor(released.load(std::memory_order_acquire) ? Grace : Infinite);
+        AwaitFor(released_.load(std::memory_order_acquire) ? Grace : Infinite);
     }
     // A signal that was not seen may still come: such an event is not used again.
-    return signalled ? std::move(event) : OwnedHandle();
+    return signalled_ ? std::move(event_) : OwnedHandle();
 }
 
 void Waiter::Release(Waiter* first) noexcept {
     while (first != nullptr) {
         Waiter& waiter = *std::exchange(first, first->next);
-        const Handle handle = waiter.event.Get();
-        waiter.released.store(true, std::memory_order_release);
+        const Handle handle = waiter.event_.Get();
+        waiter.released_.store(true, std::memory_order_release);
         if (handle != NoHandle) {
             SignalSurely(handle);
         }

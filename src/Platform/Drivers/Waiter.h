@@ -30,9 +30,9 @@ struct Waiter {
     static void Release(Waiter* first) noexcept;
 
   private:
-    OwnedHandle event;  ///< none if it cannot be made: then `released` is polled
-    bool signalled = false;
-    std::atomic<bool> released{false};
+    OwnedHandle event_;  ///< none if it cannot be made: then `released` is polled
+    bool signalled_ = false;
+    std::atomic<bool> released_{false};
 };
 
 }  // namespace Varnholt::Platform::Drivers

@@ -17,15 +17,15 @@ namespace {
 class EnteringSection final : public BlockedCall {
   public:
     EnteringSection(ThreadRecord& caller, std::uint32_t ownersNumber)
-        : BlockedCall(caller), owner(ownersNumber) {}
+        : BlockedCall(caller), owner_(ownersNumber) {}
     std::string Describe() const override {
-        return "a critical section owned by thread " + std::to_string(owner);
+        return "a critical section owned by thread " + std::to_string(owner_);
     }
 
     EnteringSection* next = nullptr;
 
   private:
-    const std::uint32_t owner;
+    const std::uint32_t owner_;
 };
 
 }  // namespace
@@ -90,7 +90,7 @@ void CriticalSection::Impl::LeaveInTurn(Clock& clock) {
 
 CriticalSection::CriticalSection() {
     static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
-    std::construct_at(reinterpret_cast<Impl*>(storage));
+    std::construct_at(reinterpret_cast<Impl*>(storage_));
 }
 
 CriticalSection::~CriticalSection() {
@@ -98,7 +98,7 @@ CriticalSection::~CriticalSection() {
 }
 
 CriticalSection::Impl& CriticalSection::Own() {
-    return *std::launder(reinterpret_cast<Impl*>(storage));
+    return *std::launder(reinterpret_cast<Impl*>(storage_));
 }
 
 void CriticalSection::Enter() {

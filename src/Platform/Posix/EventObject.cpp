@@ -5,11 +5,11 @@
 namespace Varnholt::Platform::Posix {
 
 WaitableObject::Taken EventObject::TryTake(ThreadRecord& /*taker*/) {
-    return std::exchange(signalled, false) ? Taken::Yes : Taken::No;
+    return std::exchange(signalled_, false) ? Taken::Yes : Taken::No;
 }
 
 ErrorCode EventObject::Signal(ThreadRecord& /*signaller*/) {
-    signalled = true;
+    signalled_ = true;
     OfferToWaiters();
     return Errors::Success;
 }

@@ -12,7 +12,7 @@ class EventObject final : public WaitableObject {
     std::string Describe() const override { return "an event"; }
 
   private:
-    bool signalled = false;
+    bool signalled_ = false;
 };
 
 }  // namespace Varnholt::Platform::Posix

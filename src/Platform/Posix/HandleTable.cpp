@@ -24,21 +24,21 @@ HandleTable& HandleTable::Instance() {
 Handle HandleTable::Add(ObjectRef object) {
     {
         const KernelHold hold;
-        ++object->handles;
+        ++object->handles_;
     }
-    const std::unique_lock held(lock);
+    const std::unique_lock held(lock_);
     do {
-        last = last == 0 ? FirstValue : last + Step;
-    } while (objects.contains(last));
-    objects.emplace(last, std::move(object));
-    return reinterpret_cast<Handle>(last);
+        last_ = last_ == 0 ? FirstValue : last_ + Step;
+    } while (objects_.contains(last_));
+    objects_.emplace(last_, std::move(object));
+    return reinterpret_cast<Handle>(last_);
 }
 
 ObjectRef HandleTable::Find(Handle handle) {
     {
-        const std::shared_lock held(lock);
-        const auto found = objects.find(Value(handle));
-        if (found != objects.end()) {
+        const std::shared_lock held(lock_);
+        const auto found = objects_.find(Value(handle));
+        if (found != objects_.end()) {
             return found->second;
         }
     }
@@ -49,11 +49,11 @@ ObjectRef HandleTable::Find(Handle handle) {
 bool HandleTable::Close(Handle handle) {
     ObjectRef object;  // dies without a lock held: its end may be a matter of files or threads
     {
-        const std::unique_lock held(lock);
-        const auto found = objects.find(Value(handle));
-        if (found != objects.end()) {
+        const std::unique_lock held(lock_);
+        const auto found = objects_.find(Value(handle));
+        if (found != objects_.end()) {
             object = std::move(found->second);
-            objects.erase(found);
+            objects_.erase(found);
         }
     }
     if (!object) {
@@ -62,7 +62,7 @@ bool HandleTable::Close(Handle handle) {
     }
     ThreadRecord& me = CurrentThread();
     const KernelHold hold;
-    if (--object->handles == 0) {
+    if (--object->handles_ == 0) {
         object->LastHandleClosed(me);
     }
     return true;

@@ -29,9 +29,9 @@ class HandleTable final {
     bool Close(Handle handle);
 
   private:
-    std::shared_mutex lock;
-    std::map<std::uintptr_t, ObjectRef> objects;  // guarded by `lock`
-    std::uintptr_t last = 0;                      // guarded by `lock`
+    std::shared_mutex lock_;
+    std::map<std::uintptr_t, ObjectRef> objects_;  // guarded by `lock`
+    std::uintptr_t last_ = 0;                      // guarded by `lock`
 };
 
 /// Runs what makes an object and its handle. Without memory for them there is none, and `LastError` says so.

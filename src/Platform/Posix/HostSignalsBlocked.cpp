@@ -10,11 +10,11 @@ HostSignalsBlocked::HostSignalsBlocked() {
     for (const int fault : {SIGSEGV, SIGBUS, SIGFPE, SIGILL, SIGTRAP, SIGABRT, SIGSYS}) {
         sigdelset(&blocked, fault);
     }
-    pthread_sigmask(SIG_SETMASK, &blocked, &before);
+    pthread_sigmask(SIG_SETMASK, &blocked, &before_);
 }
 
 HostSignalsBlocked::~HostSignalsBlocked() {
-    pthread_sigmask(SIG_SETMASK, &before, nullptr);
+    pthread_sigmask(SIG_SETMASK, &before_, nullptr);
 }
 
 }  // namespace Varnholt::Platform::Posix

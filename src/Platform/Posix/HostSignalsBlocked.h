@@ -16,7 +16,7 @@ class HostSignalsBlocked final {
     HostSignalsBlocked& operator=(const HostSignalsBlocked&) = delete;
 
   private:
-    sigset_t before{};
+    sigset_t before_{};
 };
 
 }  // namespace Varnholt::Platform::Posix

@@ -13,15 +13,15 @@ class Immortal final {
   public:
     template <typename... Arguments>
     explicit Immortal(Arguments&&... arguments) {
-        new (storage) Object(std::forward<Arguments>(arguments)...);
+        new (storage_) Object(std::forward<Arguments>(arguments)...);
     }
     Immortal(const Immortal&) = delete;
     Immortal& operator=(const Immortal&) = delete;
 
-    Object& operator*() { return *std::launder(reinterpret_cast<Object*>(storage)); }
+    Object& operator*() { return *std::launder(reinterpret_cast<Object*>(storage_)); }
 
   private:
-    alignas(Object) unsigned char storage[sizeof(Object)];
+    alignas(Object) unsigned char storage_[sizeof(Object)];
 };
 
 }  // namespace Varnholt::Platform::Posix

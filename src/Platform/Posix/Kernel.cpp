@@ -56,30 +56,30 @@ void ForgetThread(void* record) {
 /// library from being unloaded for as long as a thread lives that once used it.
 class EndOfThreadHook final {
   public:
-    EndOfThreadHook() : valid(pthread_key_create(&key, ForgetThread) == 0) {}
+    EndOfThreadHook() : valid_(pthread_key_create(&key_, ForgetThread) == 0) {}
     ~EndOfThreadHook() {
-        if (!valid) {
+        if (!valid_) {
             return;
         }
-        if (void* const record = pthread_getspecific(key)) {
-            pthread_setspecific(key, nullptr);
+        if (void* const record = pthread_getspecific(key_)) {
+            pthread_setspecific(key_, nullptr);
             ForgetThread(record);
         }
-        pthread_key_delete(key);
-        valid = false;
+        pthread_key_delete(key_);
+        valid_ = false;
     }
     EndOfThreadHook(const EndOfThreadHook&) = delete;
     EndOfThreadHook& operator=(const EndOfThreadHook&) = delete;
 
     void Watch(ThreadRecord& thread) {
-        if (valid) {
-            pthread_setspecific(key, &thread);
+        if (valid_) {
+            pthread_setspecific(key_, &thread);
         }
     }
 
   private:
-    pthread_key_t key{};
-    bool valid;
+    pthread_key_t key_{};
+    bool valid_;
 } endOfThread;
 
 }  // namespace

@@ -5,61 +5,61 @@
 namespace Varnholt::Platform::Posix {
 
 WaitableObject::Taken MutexObject::TryTake(ThreadRecord& taker) {
-    if (owner == &taker) {
-        ++depth;
+    if (owner_ == &taker) {
+        ++depth_;
         return Taken::Yes;
     }
-    if (owner) {
+    if (owner_) {
         return Taken::No;
     }
     taker.owned.reserve(taker.owned.size() + 1);  // nothing may fail once the mutex is taken
     const Taken taken = TakeFree();
     if (taken != Taken::No) {
         taker.owned.push_back(shared_from_this());
-        owner = &taker;
-        depth = 1;
+        owner_ = &taker;
+        depth_ = 1;
     }
     return taken;
 }
 
 WaitableObject::Taken MutexObject::TakeFree() {
-    return wasAbandoned ? Taken::Abandoned : Taken::Yes;
+    return wasAbandoned_ ? Taken::Abandoned : Taken::Yes;
 }
 
 void MutexObject::LetGo(bool isAbandoned) {
-    wasAbandoned = isAbandoned;
+    wasAbandoned_ = isAbandoned;
 }
 
 ErrorCode MutexObject::Release(ThreadRecord& releaser) {
-    if (owner != &releaser) {
+    if (owner_ != &releaser) {
         return Errors::NotOwner;
     }
-    if (--depth > 0) {
+    if (--depth_ > 0) {
         return Errors::Success;
     }
     std::erase_if(releaser.owned, [this](const auto& owned) { return owned.get() == this; });
-    owner = nullptr;
+    owner_ = nullptr;
     LetGo(false);
     OfferToWaiters();
     return Errors::Success;
 }
 
 void MutexObject::Abandon() {
-    owner = nullptr;
-    depth = 0;
+    owner_ = nullptr;
+    depth_ = 0;
     LetGo(true);
     OfferToWaiters();
 }
 
 void MutexObject::LastHandleClosed(ThreadRecord& closer) {
-    if (owner == &closer) {
+    if (owner_ == &closer) {
         std::erase_if(closer.owned, [this](const auto& owned) { return owned.get() == this; });
         Abandon();
     }
 }
 
 std::string MutexObject::Describe() const {
-    return owner ? "a mutex owned by thread " + std::to_string(owner->number) : "a mutex";
+    return owner_ ? "a mutex owned by thread " + std::to_string(owner_->number) : "a mutex";
 }
 
 }  // namespace Varnholt::Platform::Posix

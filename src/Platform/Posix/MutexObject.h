@@ -20,7 +20,7 @@ class MutexObject : public WaitableObject, public std::enable_shared_from_this<M
     void Abandon();
 
   protected:
-    bool IsOwnedHere() const { return owner != nullptr; }
+    bool IsOwnedHere() const { return owner_ != nullptr; }
 
   private:
     /// Where the mutex is kept while no thread of this process owns it: called on the thread that takes it,
@@ -28,9 +28,9 @@ class MutexObject : public WaitableObject, public std::enable_shared_from_this<M
     virtual Taken TakeFree();
     virtual void LetGo(bool isAbandoned);
 
-    ThreadRecord* owner = nullptr;
-    unsigned depth = 0;
-    bool wasAbandoned = false;  ///< by its last owner
+    ThreadRecord* owner_ = nullptr;
+    unsigned depth_ = 0;
+    bool wasAbandoned_ = false;  ///< by its last owner
 };
 
 }  // namespace Varnholt::Platform::Posix

@@ -16,22 +16,22 @@ class OpenObjects final {
   public:
     template <typename Make>
     std::shared_ptr<Object> Open(const std::string& name, Make make) {
-        const std::lock_guard held(lock);
-        std::erase_if(objects, [](const auto& entry) { return entry.second.expired(); });
-        const auto found = objects.find(name);
-        auto object = found == objects.end() ? nullptr : found->second.lock();
+        const std::lock_guard held(lock_);
+        std::erase_if(objects_, [](const auto& entry) { return entry.second.expired(); });
+        const auto found = objects_.find(name);
+        auto object = found == objects_.end() ? nullptr : found->second.lock();
         if (!object) {
             object = make();
             if (object) {
-                objects[name] = object;
+                objects_[name] = object;
             }
         }
         return object;
     }
 
   private:
-    std::mutex lock;
-    std::map<std::string, std::weak_ptr<Object>> objects;  // guarded by `lock`
+    std::mutex lock_;
+    std::map<std::string, std::weak_ptr<Object>> objects_;  // guarded by `lock`
 };
 
 Immortal<OpenObjects<MutexObject>> openMutexes;

@@ -39,9 +39,9 @@ RealScheduler& RealScheduler::Instance() {
 }
 
 RealScheduler::~RealScheduler() {
-    Hold hold(lock);
-    decltype(events) dropped;
-    dropped.swap(events);
+    Hold hold(lock_);
+    decltype(events_) dropped;
+    dropped.swap(events_);
     WaitForEnd(hold);
     hold.unlock();
 }
@@ -52,17 +52,17 @@ std::uint64_t RealScheduler::Now() {
 
 EventScheduler::EventId RealScheduler::CallAt(std::uint64_t time, std::function<void()> event) {
     const EventId id = NewEventId();
-    Hold hold(lock);
+    Hold hold(lock_);
     JoinEndedThread(hold);
-    const auto place = events.emplace(std::pair(time, id), std::move(event)).first;
-    if (threadState == ThreadState::None) {
+    const auto place = events_.emplace(std::pair(time, id), std::move(event)).first;
+    if (threadState_ == ThreadState::None) {
         StartThread();
     }
-    if (place == events.begin()) {
-        (waiterEntered ? waitersTurn : threadsTurn).notify_one();
+    if (place == events_.begin()) {
+        (waiterEntered_ ? waitersTurn_ : threadsTurn_).notify_one();
     }
-    callEnded.notify_all();  // the end of the thread is not to be waited for any more
-    const bool isAnEventsOwn = running != 0 && runner == std::this_thread::get_id();
+    callEnded_.notify_all();  // the end of the thread is not to be waited for any more
+    const bool isAnEventsOwn = running_ != 0 && runner_ == std::this_thread::get_id();
     hold.unlock();
     if (!isAnEventsOwn) {
         WorkOffInWaits(weak_from_this());
@@ -72,28 +72,28 @@ EventScheduler::EventId RealScheduler::CallAt(std::uint64_t time, std::function<
 
 void RealScheduler::Forget(EventId id) {
     std::function<void()> dropped;  // what it holds may be anything: it goes without the lock
-    Hold hold(lock);
+    Hold hold(lock_);
     const auto found =
-        std::ranges::find_if(events, [id](const auto& waiting) { return waiting.first.second == id; });
-    if (found != events.end()) {
+        std::ranges::find_if(events_, [id](const auto& waiting) { return waiting.first.second == id; });
+    if (found != events_.end()) {
         dropped = std::move(found->second);
-        events.erase(found);
+        events_.erase(found);
     }
-    if (running != 0 && runner == std::this_thread::get_id()) {
+    if (running_ != 0 && runner_ == std::this_thread::get_id()) {
         return;  // from inside an event
     }
-    callEnded.wait(hold, [this, id] { return running != id; });
-    if (events.empty() && running == 0) {
+    callEnded_.wait(hold, [this, id] { return running_ != id; });
+    if (events_.empty() && running_ == 0) {
         WaitForEnd(hold);
     }
     hold.unlock();
 }
 
 void RealScheduler::StartThread() {
-    threadState = ThreadState::Running;
-    if (!StartSystemThread(thread, RunThread, this)) {
+    threadState_ = ThreadState::Running;
+    if (!StartSystemThread(thread_, RunThread, this)) {
         // Without a thread the events wait for the next call that can have one: late, but not lost.
-        threadState = ThreadState::None;
+        threadState_ = ThreadState::None;
     }
 }
 
@@ -106,56 +106,56 @@ void* RealScheduler::RunThread(void* scheduler) {
 }
 
 void RealScheduler::CallEvents() {
-    Hold hold(lock);
-    while (!events.empty()) {
+    Hold hold(lock_);
+    while (!events_.empty()) {
         const Microseconds now = Now();
-        Microseconds time = std::max(events.begin()->first.first, leftToWaiters);
-        if (waiterEntered) {
+        Microseconds time = std::max(events_.begin()->first.first, leftToWaiters_);
+        if (waiterEntered_) {
             time = std::max(time, now + Patience);
         }
         if (time > now) {
             // A time so far off that the system's clock could not hold it is approached in steps.
-            threadsTurn.wait_until(hold, At(std::min(time, now + LongestStep)));
+            threadsTurn_.wait_until(hold, At(std::min(time, now + LongestStep)));
         } else {
             CallNext(hold);
         }
     }
-    threadState = ThreadState::Ended;
-    callEnded.notify_all();
+    threadState_ = ThreadState::Ended;
+    callEnded_.notify_all();
 }
 
 void RealScheduler::CallNext(Hold& hold) {
-    const auto next = events.begin();
-    running = next->first.second;
-    runner = std::this_thread::get_id();
+    const auto next = events_.begin();
+    running_ = next->first.second;
+    runner_ = std::this_thread::get_id();
     std::function<void()> event = std::move(next->second);
-    events.erase(next);
+    events_.erase(next);
     hold.unlock();
     event();
     event = nullptr;
     hold.lock();
-    running = 0;
-    callEnded.notify_all();
-    if (events.empty()) {
-        threadsTurn.notify_one();
+    running_ = 0;
+    callEnded_.notify_all();
+    if (events_.empty()) {
+        threadsTurn_.notify_one();
     }
 }
 
 bool RealScheduler::TryEnter() {
-    const Hold hold(lock);
-    if (waiterEntered || running != 0 || events.empty()) {
+    const Hold hold(lock_);
+    if (waiterEntered_ || running_ != 0 || events_.empty()) {
         return false;
     }
-    waiterEntered = true;
-    interrupted = false;
+    waiterEntered_ = true;
+    interrupted_ = false;
     return true;
 }
 
 void RealScheduler::WorkOff(Microseconds deadline) {
-    Hold hold(lock);
-    while (!interrupted && !events.empty()) {
+    Hold hold(lock_);
+    while (!interrupted_ && !events_.empty()) {
         const Microseconds now = Now();
-        const Microseconds time = events.begin()->first.first;
+        const Microseconds time = events_.begin()->first.first;
         if (now >= time) {
             CallNext(hold);
             break;
@@ -165,38 +165,38 @@ void RealScheduler::WorkOff(Microseconds deadline) {
         }
         const Microseconds end = std::min({time, deadline, now + LongestStep});
         if (end - now > SleepSlack) {
-            waitersTurn.wait_until(hold, At(end - SleepSlack));
+            waitersTurn_.wait_until(hold, At(end - SleepSlack));
         } else {
             hold.unlock();
             sched_yield();
             hold.lock();
         }
     }
-    waiterEntered = false;
-    leftToWaiters = Now() + Patience;
+    waiterEntered_ = false;
+    leftToWaiters_ = Now() + Patience;
     hold.unlock();
 }
 
 void RealScheduler::Interrupt() {
-    const Hold hold(lock);
-    interrupted = true;
-    waitersTurn.notify_one();
+    const Hold hold(lock_);
+    interrupted_ = true;
+    waitersTurn_.notify_one();
 }
 
 void RealScheduler::JoinEndedThread(Hold& hold) {
-    if (threadState != ThreadState::Ended) {
+    if (threadState_ != ThreadState::Ended) {
         return;
     }
-    threadState = ThreadState::None;
-    const pthread_t ended = thread;
+    threadState_ = ThreadState::None;
+    const pthread_t ended = thread_;
     hold.unlock();
     pthread_join(ended, nullptr);
     hold.lock();
 }
 
 void RealScheduler::WaitForEnd(Hold& hold) {
-    threadsTurn.notify_one();
-    callEnded.wait(hold, [this] { return threadState != ThreadState::Running || !events.empty(); });
+    threadsTurn_.notify_one();
+    callEnded_.wait(hold, [this] { return threadState_ != ThreadState::Running || !events_.empty(); });
     JoinEndedThread(hold);
 }
 

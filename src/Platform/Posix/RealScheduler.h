@@ -47,18 +47,18 @@ class RealScheduler final : public EventScheduler,
     void JoinEndedThread(Hold& hold);
     void WaitForEnd(Hold& hold);
 
-    std::mutex lock;  // of everything below; nothing else is locked while it is held
-    std::map<std::pair<Microseconds, EventId>, std::function<void()>> events;
-    EventId running = 0;
-    std::thread::id runner;             // of the event that is running
-    std::condition_variable callEnded;  // an event's, or the thread's
-    std::condition_variable threadsTurn;
-    std::condition_variable waitersTurn;
-    enum class ThreadState { None, Running, Ended } threadState = ThreadState::None;
-    pthread_t thread{};
-    bool waiterEntered = false;
-    bool interrupted = false;
-    Microseconds leftToWaiters = 0;  // the thread sleeps until then
+    std::mutex lock_;  // of everything below; nothing else is locked while it is held
+    std::map<std::pair<Microseconds, EventId>, std::function<void()>> events_;
+    EventId running_ = 0;
+    std::thread::id runner_;             // of the event that is running
+    std::condition_variable callEnded_;  // an event's, or the thread's
+    std::condition_variable threadsTurn_;
+    std::condition_variable waitersTurn_;
+    enum class ThreadState { None, Running, Ended } threadState_ = ThreadState::None;
+    pthread_t thread_{};
+    bool waiterEntered_ = false;
+    bool interrupted_ = false;
+    Microseconds leftToWaiters_ = 0;  // the thread sleeps until then
 };
 
 }  // namespace Varnholt::Platform::Posix

@@ -18,18 +18,18 @@ ErrorCode SemaphoreObject::Release(std::int32_t count) {
 }
 
 WaitableObject::Taken LocalSemaphore::TryTake(ThreadRecord& /*taker*/) {
-    if (available == 0) {
+    if (available_ == 0) {
         return Taken::No;
     }
-    --available;
+    --available_;
     return Taken::Yes;
 }
 
 bool LocalSemaphore::Add(std::int32_t count) {
-    if (count > maximum - available) {
+    if (count > maximum_ - available_) {
         return false;
     }
-    available += count;
+    available_ += count;
     return true;
 }
 

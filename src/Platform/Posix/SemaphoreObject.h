@@ -22,15 +22,15 @@ class SemaphoreObject : public WaitableObject {
 class LocalSemaphore final : public SemaphoreObject {
   public:
     LocalSemaphore(std::int32_t initialCount, std::int32_t maximumCount)
-        : available(initialCount), maximum(maximumCount) {}
+        : available_(initialCount), maximum_(maximumCount) {}
 
     Taken TryTake(ThreadRecord& taker) override;
 
   private:
     bool Add(std::int32_t count) override;
 
-    std::int32_t available;
-    const std::int32_t maximum;
+    std::int32_t available_;
+    const std::int32_t maximum_;
 };
 
 }  // namespace Varnholt::Platform::Posix

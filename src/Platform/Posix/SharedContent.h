@@ -22,8 +22,8 @@ class ChangeCount final {
 
   private:
     // Only through `std::atomic_ref`.
-    mutable std::uint32_t changes = 0;
-    std::uint32_t sleepers = 0;
+    mutable std::uint32_t changes_ = 0;
+    std::uint32_t sleepers_ = 0;
 };
 
 /// Begins the content of every file; tells our memory from other content, and from that of a process with

@@ -65,8 +65,8 @@ class SharedFile::OpenFile final {
     OpenFile() = default;
     ~OpenFile() {
         Unmap();
-        if (descriptor >= 0) {
-            close(descriptor);
+        if (descriptor_ >= 0) {
+            close(descriptor_);
         }
     }
     OpenFile(const OpenFile&) = delete;
@@ -75,31 +75,31 @@ class SharedFile::OpenFile final {
     /// Once; false with the reason in `errno`. The object is there before the file is, so that no failure
     /// comes between the two.
     bool Open(const UserDirectory& directory, const char* name, int flags, mode_t mode = 0) {
-        descriptor = openat(directory.Descriptor(), name, flags, mode);
-        return descriptor >= 0;
+        descriptor_ = openat(directory.Descriptor(), name, flags, mode);
+        return descriptor_ >= 0;
     }
-    int Get() const { return descriptor; }
-    void* Memory() const { return memory; }
+    int Get() const { return descriptor_; }
+    void* Memory() const { return memory_; }
 
     bool Map(std::size_t mappedSize) {
-        void* const mapped = mmap(nullptr, mappedSize, PROT_READ | PROT_WRITE, MAP_SHARED, descriptor, 0);
+        void* const mapped = mmap(nullptr, mappedSize, PROT_READ | PROT_WRITE, MAP_SHARED, descriptor_, 0);
         if (mapped == MAP_FAILED) {
             return false;
         }
-        memory = mapped;
-        size = mappedSize;
+        memory_ = mapped;
+        size_ = mappedSize;
         return true;
     }
     void Unmap() {
-        if (memory) {
-            munmap(std::exchange(memory, nullptr), size);
+        if (memory_) {
+            munmap(std::exchange(memory_, nullptr), size_);
         }
     }
 
   private:
-    int descriptor = -1;
-    void* memory = nullptr;
-    std::size_t size = 0;
+    int descriptor_ = -1;
+    void* memory_ = nullptr;
+    std::size_t size_ = 0;
 };
 
 /// The steps of `Open`.
@@ -182,7 +182,7 @@ struct SharedFile::Attempts {
 
 SharedFile::SharedFile(std::unique_ptr<UserDirectory> usersDirectory, std::string fileName,
                        std::unique_ptr<OpenFile> opened)
-    : directory(std::move(usersDirectory)), name(std::move(fileName)), file(std::move(opened)) {}
+    : directory_(std::move(usersDirectory)), name_(std::move(fileName)), file_(std::move(opened)) {}
 
 std::unique_ptr<SharedFile> SharedFile::Open(const std::string& kind, const std::string& name,
                                              const Content& content) {
@@ -206,18 +206,18 @@ std::unique_ptr<SharedFile> SharedFile::Open(const std::string& kind, const std:
 }
 
 SharedFile::~SharedFile() {
-    file->Unmap();
-    if (flock(file->Get(), LOCK_EX | LOCK_NB) != 0) {
+    file_->Unmap();
+    if (flock(file_->Get(), LOCK_EX | LOCK_NB) != 0) {
         return;  // others use it
     }
     struct stat state {};
-    if (fstat(file->Get(), &state) == 0 && state.st_nlink > 0) {
-        unlinkat(directory->Descriptor(), name.c_str(), 0);
+    if (fstat(file_->Get(), &state) == 0 && state.st_nlink > 0) {
+        unlinkat(directory_->Descriptor(), name_.c_str(), 0);
     }
 }
 
 void* SharedFile::Memory() const {
-    return file->Memory();
+    return file_->Memory();
 }
 
 std::string SharedFile::FileNameOf(const std::string& kind, const std::string& name) {

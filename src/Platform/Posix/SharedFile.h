@@ -46,9 +46,9 @@ class SharedFile final {
     SharedFile(std::unique_ptr<UserDirectory> usersDirectory, std::string fileName,
                std::unique_ptr<OpenFile> opened);
 
-    const std::unique_ptr<UserDirectory> directory;
-    const std::string name;
-    const std::unique_ptr<OpenFile> file;
+    const std::unique_ptr<UserDirectory> directory_;
+    const std::string name_;
+    const std::unique_ptr<OpenFile> file_;
 };
 
 }  // namespace Varnholt::Platform::Posix

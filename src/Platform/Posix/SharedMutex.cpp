@@ -39,36 +39,36 @@ struct MutexContent {
 class SharedMutex final : public MutexObject {
   public:
     explicit SharedMutex(std::unique_ptr<SharedFile> opened)
-        : file(std::move(opened)), content(*static_cast<MutexContent*>(file->Memory())) {}
+        : file_(std::move(opened)), content_(*static_cast<MutexContent*>(file_->Memory())) {}
 
     bool CanBeTakenForOthers() const override { return false; }
     bool IsHeldElsewhere() const override { return !IsOwnedHere(); }
-    std::uint32_t Changes() const override { return content.header.changes.Get(); }
+    std::uint32_t Changes() const override { return content_.header.changes.Get(); }
     void AwaitChange(std::uint32_t seen, Microseconds limit) override {
-        content.header.changes.Await(seen, limit);
+        content_.header.changes.Await(seen, limit);
     }
     std::string Describe() const override { return MutexObject::Describe() + " shared between processes"; }
 
   private:
     Taken TakeFree() override {
-        const int code = pthread_mutex_trylock(&content.mutex);
+        const int code = pthread_mutex_trylock(&content_.mutex);
         if (code == EOWNERDEAD) {
-            pthread_mutex_consistent(&content.mutex);
+            pthread_mutex_consistent(&content_.mutex);
             return Taken::Abandoned;
         }
         if (code != 0) {
             return Taken::No;
         }
-        return content.abandoned != 0 ? Taken::Abandoned : Taken::Yes;
+        return content_.abandoned != 0 ? Taken::Abandoned : Taken::Yes;
     }
     void LetGo(bool isAbandoned) override {
-        content.abandoned = isAbandoned;
-        pthread_mutex_unlock(&content.mutex);
-        content.header.changes.Increment();
+        content_.abandoned = isAbandoned;
+        pthread_mutex_unlock(&content_.mutex);
+        content_.header.changes.Increment();
     }
 
-    const std::unique_ptr<SharedFile> file;
-    MutexContent& content;
+    const std::unique_ptr<SharedFile> file_;
+    MutexContent& content_;
 };
 
 }  // namespace

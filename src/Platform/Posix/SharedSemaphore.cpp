@@ -23,15 +23,15 @@ struct SemaphoreContent {
 class SharedSemaphore final : public SemaphoreObject {
   public:
     explicit SharedSemaphore(std::unique_ptr<SharedFile> opened)
-        : file(std::move(opened)), content(*static_cast<SemaphoreContent*>(file->Memory())) {}
+        : file_(std::move(opened)), content_(*static_cast<SemaphoreContent*>(file_->Memory())) {}
 
     bool IsHeldElsewhere() const override { return true; }
-    std::uint32_t Changes() const override { return content.header.changes.Get(); }
+    std::uint32_t Changes() const override { return content_.header.changes.Get(); }
     void AwaitChange(std::uint32_t seen, Microseconds limit) override {
-        content.header.changes.Await(seen, limit);
+        content_.header.changes.Await(seen, limit);
     }
     Taken TryTake(ThreadRecord& /*taker*/) override {
-        const std::atomic_ref available(content.available);
+        const std::atomic_ref available(content_.available);
         std::int32_t count = available.load();
         while (count > 0) {
             if (available.compare_exchange_weak(count, count - 1)) {
@@ -43,19 +43,19 @@ class SharedSemaphore final : public SemaphoreObject {
 
   private:
     bool Add(std::int32_t added) override {
-        const std::atomic_ref available(content.available);
+        const std::atomic_ref available(content_.available);
         std::int32_t count = available.load();
         do {
-            if (count < 0 || count > content.maximum || added > content.maximum - count) {
+            if (count < 0 || count > content_.maximum || added > content_.maximum - count) {
                 return false;
             }
         } while (!available.compare_exchange_weak(count, count + added));
-        content.header.changes.Increment();
+        content_.header.changes.Increment();
         return true;
     }
 
-    const std::unique_ptr<SharedFile> file;
-    SemaphoreContent& content;
+    const std::unique_ptr<SharedFile> file_;
+    SemaphoreContent& content_;
 };
 
 }  // namespace

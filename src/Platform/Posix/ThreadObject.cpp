@@ -4,7 +4,7 @@ namespace Varnholt::Platform::Posix {
 
 ThreadObject::~ThreadObject() {
     // The last reference is often the thread's own.
-    if (!joined && pthread_equal(thread, pthread_self())) {
+    if (!joined_ && pthread_equal(thread, pthread_self())) {
         pthread_detach(thread);
     } else {
         JoinOnce();
@@ -12,7 +12,7 @@ ThreadObject::~ThreadObject() {
 }
 
 WaitableObject::Taken ThreadObject::TryTake(ThreadRecord& /*taker*/) {
-    return ended ? Taken::Yes : Taken::No;
+    return ended_ ? Taken::Yes : Taken::No;
 }
 
 ErrorCode ThreadObject::Signal(ThreadRecord& /*signaller*/) {
@@ -24,7 +24,7 @@ void ThreadObject::AfterWait() {
 }
 
 void ThreadObject::JoinOnce() {
-    if (!joined.exchange(true)) {
+    if (!joined_.exchange(true)) {
         pthread_join(thread, nullptr);
     }
 }
@@ -34,7 +34,7 @@ std::string ThreadObject::Describe() const {
 }
 
 void ThreadObject::End() {
-    ended = true;
+    ended_ = true;
     OfferToWaiters();
 }
 

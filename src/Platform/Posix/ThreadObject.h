@@ -26,13 +26,13 @@ class ThreadObject final : public WaitableObject {
     pthread_t thread{};
     std::uint32_t number = 0;
     /// Whether there is a thread of the system behind the object; of its maker.
-    void MustBeJoined(bool exists) { joined = !exists; }
+    void MustBeJoined(bool exists) { joined_ = !exists; }
 
   private:
     void JoinOnce();
 
-    bool ended = false;  // guarded by the kernel lock
-    std::atomic<bool> joined = true;
+    bool ended_ = false;  // guarded by the kernel lock
+    std::atomic<bool> joined_ = true;
 };
 
 }  // namespace Varnholt::Platform::Posix

@@ -21,15 +21,15 @@ std::unique_ptr<UserDirectory> UserDirectory::Open(const std::string& above) {
     const std::string first = above + Prefix + std::to_string(geteuid());
     // Ends: every name that somebody else has taken costs him memory of the machine.
     for (unsigned taken = 0;; ++taken) {
-        directory->path = taken == 0 ? first : first + "." + std::to_string(taken);
-        const char* const path = directory->path.c_str();
+        directory->path_ = taken == 0 ? first : first + "." + std::to_string(taken);
+        const char* const path = directory->path_.c_str();
         if (mkdir(path, S_IRWXU) != 0 && errno != EEXIST) {
             SetLastError(CodeOf(errno));
             return nullptr;
         }
         // O_PATH asks for no permission: who owns the directory is told of others' too.
-        directory->descriptor = open(path, O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-        if (directory->descriptor < 0) {
+        directory->descriptor_ = open(path, O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+        if (directory->descriptor_ < 0) {
             if (errno == ENOTDIR || errno == ELOOP || errno == ENOENT) {
                 continue;  // a file or link, or gone meanwhile
             }
@@ -37,17 +37,17 @@ std::unique_ptr<UserDirectory> UserDirectory::Open(const std::string& above) {
             return nullptr;
         }
         struct stat state {};
-        if (fstat(directory->descriptor, &state) == 0 && state.st_uid == geteuid()) {
+        if (fstat(directory->descriptor_, &state) == 0 && state.st_uid == geteuid()) {
             return directory;
         }
-        close(directory->descriptor);
-        directory->descriptor = -1;
+        close(directory->descriptor_);
+        directory->descriptor_ = -1;
     }
 }
 
 UserDirectory::~UserDirectory() {
-    if (descriptor >= 0) {
-        close(descriptor);
+    if (descriptor_ >= 0) {
+        close(descriptor_);
     }
 }
 

@@ -24,14 +24,14 @@ class UserDirectory final {
     UserDirectory& operator=(const UserDirectory&) = delete;
 
     /// For the system's operations on what is in a directory.
-    int Descriptor() const { return descriptor; }
-    const std::string& Path() const { return path; }
+    int Descriptor() const { return descriptor_; }
+    const std::string& Path() const { return path_; }
 
   private:
     UserDirectory() = default;
 
-    std::string path;
-    int descriptor = -1;
+    std::string path_;
+    int descriptor_ = -1;
 };
 
 }  // namespace Varnholt::Platform::Posix

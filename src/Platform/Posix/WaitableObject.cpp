@@ -14,22 +14,22 @@ constexpr Microseconds LongestLook = 4000;
 /// One wait, entered with each of its objects.
 class Waiter final : public BlockedCall {
   public:
-    Waiter(ThreadRecord& caller, std::span<WaitEntry> waitedFor) : BlockedCall(caller), entries(waitedFor) {
-        for (WaitEntry& entry : entries) {
+    Waiter(ThreadRecord& caller, std::span<WaitEntry> waitedFor) : BlockedCall(caller), entries_(waitedFor) {
+        for (WaitEntry& entry : entries_) {
             entry.waiter = this;
             entry.object->Enqueue(entry);
         }
-        mayWorkOff = entries.size() == 1;  // who listens to several things waits for long, and is not urgent
+        mayWorkOff = entries_.size() == 1;  // who listens to several things waits for long, and is not urgent
     }
     ~Waiter() {
-        for (WaitEntry& entry : entries) {
+        for (WaitEntry& entry : entries_) {
             entry.object->Dequeue(entry);
         }
     }
 
     bool Take() {
         const auto untilTaken = [this](const WaitEntry& entry) { return Offer(*entry.object); };
-        return std::ranges::any_of(entries, untilTaken);
+        return std::ranges::any_of(entries_, untilTaken);
     }
 
     /// True when the object was taken.
@@ -39,47 +39,47 @@ class Waiter final : public BlockedCall {
             return false;
         }
         const auto found = std::ranges::find_if(
-            entries, [&](const WaitEntry& entry) { return entry.object.get() == &object; });
-        outcome.index = static_cast<std::size_t>(found - entries.begin());
-        outcome.result =
+            entries_, [&](const WaitEntry& entry) { return entry.object.get() == &object; });
+        outcome_.index = static_cast<std::size_t>(found - entries_.begin());
+        outcome_.result =
             taken == WaitableObject::Taken::Abandoned ? WaitResult::Abandoned : WaitResult::Signalled;
         return true;
     }
 
-    bool IsSatisfied() const { return outcome.result != WaitResult::TimedOut; }
-    const WaitAnyResult& Outcome() const { return outcome; }
+    bool IsSatisfied() const { return outcome_.result != WaitResult::TimedOut; }
+    const WaitAnyResult& Outcome() const { return outcome_; }
 
     bool NeedsOtherProcess() const {
-        return std::ranges::any_of(entries,
+        return std::ranges::any_of(entries_,
                                    [](const WaitEntry& entry) { return entry.object->IsHeldElsewhere(); });
     }
 
     std::string Describe() const override {
         std::string text;
-        for (const WaitEntry& entry : entries) {
+        for (const WaitEntry& entry : entries_) {
             text += (text.empty() ? "" : " or ") + entry.object->Describe();
         }
         return text;
     }
 
   private:
-    const std::span<WaitEntry> entries;
-    WaitAnyResult outcome{WaitResult::TimedOut, 0};
+    const std::span<WaitEntry> entries_;
+    WaitAnyResult outcome_{WaitResult::TimedOut, 0};
 };
 
 void WaitableObject::Enqueue(WaitEntry& entry) {
-    entry.previous = last;
-    (last ? last->next : first) = &entry;
-    last = &entry;
+    entry.previous = last_;
+    (last_ ? last_->next : first_) = &entry;
+    last_ = &entry;
 }
 
 void WaitableObject::Dequeue(WaitEntry& entry) {
-    (entry.previous ? entry.previous->next : first) = entry.next;
-    (entry.next ? entry.next->previous : last) = entry.previous;
+    (entry.previous ? entry.previous->next : first_) = entry.next;
+    (entry.next ? entry.next->previous : last_) = entry.previous;
 }
 
 void WaitableObject::OfferToWaiters() {
-    for (const WaitEntry* entry = first; entry; entry = entry->next) {
+    for (const WaitEntry* entry = first_; entry; entry = entry->next) {
         Waiter& waiter = *entry->waiter;
         if (waiter.IsSatisfied()) {
             continue;

@@ -64,10 +64,10 @@ class WaitableObject {
     friend class Waiter;
     void Enqueue(WaitEntry& entry);
     void Dequeue(WaitEntry& entry);
-    WaitEntry* first = nullptr;  ///< has waited longest
-    WaitEntry* last = nullptr;
+    WaitEntry* first_ = nullptr;  ///< has waited longest
+    WaitEntry* last_ = nullptr;
     friend class HandleTable;
-    std::size_t handles = 0;
+    std::size_t handles_ = 0;
 };
 
 /// Waits until the object of one of `entries` could be taken for the calling thread. With the kernel lock

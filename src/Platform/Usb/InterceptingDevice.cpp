@@ -9,15 +9,15 @@ ErrorCode InterceptingDevice::Submit(Transfer& transfer) {
     copy->deviceData = nullptr;
     copy->original = &transfer;
     {
-        const std::lock_guard lock(mutex);
-        copy->id = ++lastId;
-        running[&transfer] = copy;
+        const std::lock_guard lock(mutex_);
+        copy->id = ++lastId_;
+        running_[&transfer] = copy;
     }
     const std::uint64_t id = copy->id;
     ErrorCode code = Errors::Success;
     try {
         BeforeSubmit(id, *copy);
-        code = device->Submit(*copy);
+        code = device_->Submit(*copy);
     } catch (...) {
         Take(transfer);
         throw;
@@ -32,21 +32,21 @@ ErrorCode InterceptingDevice::Submit(Transfer& transfer) {
 void InterceptingDevice::Cancel(Transfer& transfer) {
     std::shared_ptr<Copy> copy;
     {
-        const std::lock_guard lock(mutex);
-        if (const auto found = running.find(&transfer); found != running.end()) {
+        const std::lock_guard lock(mutex_);
+        if (const auto found = running_.find(&transfer); found != running_.end()) {
             copy = found->second;
         }
     }
     if (copy) {
-        device->Cancel(*copy);
+        device_->Cancel(*copy);
     }
 }
 
 std::shared_ptr<InterceptingDevice::Copy> InterceptingDevice::Take(Transfer& original) {
-    const std::lock_guard lock(mutex);
-    const auto found = running.find(&original);
+    const std::lock_guard lock(mutex_);
+    const auto found = running_.find(&original);
     std::shared_ptr<Copy> copy = std::move(found->second);
-    running.erase(found);
+    running_.erase(found);
     return copy;
 }
 

@@ -13,18 +13,18 @@ namespace Varnholt::Platform::Usb {
 /// own.
 class InterceptingDevice : public UsbDevice, private TransferClient {
   public:
-    std::vector<EndpointInfo> Endpoints(ErrorCode& error) override { return device->Endpoints(error); }
-    ErrorCode Claim() override { return device->Claim(); }
-    void Release() override { device->Release(); }
-    ErrorCode ClearHalt(std::uint8_t endpoint) override { return device->ClearHalt(endpoint); }
+    std::vector<EndpointInfo> Endpoints(ErrorCode& error) override { return device_->Endpoints(error); }
+    ErrorCode Claim() override { return device_->Claim(); }
+    void Release() override { device_->Release(); }
+    ErrorCode ClearHalt(std::uint8_t endpoint) override { return device_->ClearHalt(endpoint); }
     ErrorCode Submit(Transfer& transfer) final;
     void Cancel(Transfer& transfer) final;
 
   protected:
-    explicit InterceptingDevice(std::shared_ptr<UsbDevice> behind) : device(std::move(behind)) {}
+    explicit InterceptingDevice(std::shared_ptr<UsbDevice> behind) : device_(std::move(behind)) {}
     /// A derived class calls this first in its destructor: no transfer is under way, and none of the
     /// functions below is called, after it.
-    void Detach() { device.reset(); }
+    void Detach() { device_.reset(); }
 
     /// Before the copy is submitted; may change it.
     virtual void BeforeSubmit(std::uint64_t id, Transfer& transfer) = 0;
@@ -42,10 +42,10 @@ class InterceptingDevice : public UsbDevice, private TransferClient {
     void TransferCompleted(Transfer& transfer) noexcept final;
     std::shared_ptr<Copy> Take(Transfer& original);
 
-    std::shared_ptr<UsbDevice> device;
-    std::mutex mutex;  // guards what follows; not held while the device or a client is called
-    std::map<const Transfer*, std::shared_ptr<Copy>> running;
-    std::uint64_t lastId = 0;
+    std::shared_ptr<UsbDevice> device_;
+    std::mutex mutex_;  // guards what follows; not held while the device or a client is called
+    std::map<const Transfer*, std::shared_ptr<Copy>> running_;
+    std::uint64_t lastId_ = 0;
 };
 
 }  // namespace Varnholt::Platform::Usb

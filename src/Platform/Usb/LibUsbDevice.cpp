@@ -42,27 +42,27 @@ struct Submission {
 class LibUsbDevice final : public UsbDevice {
   public:
     LibUsbDevice(int deviceFile, libusb_context* ownContext, libusb_device_handle* openHandle) try
-        : file(deviceFile),
-          context(ownContext),
-          handle(openHandle),
-          events(std::make_shared<LibUsbEvents>(ownContext)) {
+        : file_(deviceFile),
+          context_(ownContext),
+          handle_(openHandle),
+          events_(std::make_shared<LibUsbEvents>(ownContext)) {
     } catch (...) {
         CloseAll(deviceFile, ownContext, openHandle);
     }
 
     ~LibUsbDevice() override {
         {
-            events->HandleAlways();  // nobody needs to wait any more
-            std::unique_lock lock(mutex);
-            for (Submission* submission : running) {
+            events_->HandleAlways();  // nobody needs to wait any more
+            std::unique_lock lock(mutex_);
+            for (Submission* submission : running_) {
                 libusb_cancel_transfer(submission->transfer);
             }
-            idle.wait(lock, [this] { return running.empty() && completing == 0; });
+            idle_.wait(lock, [this] { return running_.empty() && completing_ == 0; });
         }
         Release();
-        events->Stop();
-        spare.clear();
-        CloseAll(file, context, handle);
+        events_->Stop();
+        spare_.clear();
+        CloseAll(file_, context_, handle_);
     }
 
     std::vector<EndpointInfo> Endpoints(ErrorCode& error) override;
@@ -71,7 +71,7 @@ class LibUsbDevice final : public UsbDevice {
     ErrorCode Submit(Transfer& transfer) override;
     void Cancel(Transfer& transfer) override;
     ErrorCode ClearHalt(std::uint8_t endpoint) override {
-        return ErrorFromLibUsb(libusb_clear_halt(handle, endpoint));
+        return ErrorFromLibUsb(libusb_clear_halt(handle_, endpoint));
     }
 
   private:
@@ -80,17 +80,17 @@ class LibUsbDevice final : public UsbDevice {
     static void CloseAll(int file, libusb_context* context, libusb_device_handle* handle);
     std::unique_ptr<Submission> TakeSpare();
 
-    const int file;
-    libusb_context* const context;
-    libusb_device_handle* const handle;
-    const std::shared_ptr<LibUsbEvents> events;
+    const int file_;
+    libusb_context* const context_;
+    libusb_device_handle* const handle_;
+    const std::shared_ptr<LibUsbEvents> events_;
 
-    std::mutex mutex;  // guards what follows; never held while a client is called
-    std::condition_variable idle;
-    std::vector<Submission*> running;
-    std::vector<std::unique_ptr<Submission>> spare;
-    int completing = 0;  // clients being told of a completion
-    bool claimed = false;
+    std::mutex mutex_;  // guards what follows; never held while a client is called
+    std::condition_variable idle_;
+    std::vector<Submission*> running_;
+    std::vector<std::unique_ptr<Submission>> spare_;
+    int completing_ = 0;  // clients being told of a completion
+    bool claimed_ = false;
 };
 
 void LibUsbDevice::CloseAll(int file, libusb_context* context, libusb_device_handle* handle) {
@@ -102,7 +102,7 @@ void LibUsbDevice::CloseAll(int file, libusb_context* context, libusb_device_han
 std::vector<EndpointInfo> LibUsbDevice::Endpoints(ErrorCode& error) {
     std::vector<EndpointInfo> endpoints;
     libusb_config_descriptor* configuration = nullptr;
-    error = ErrorFromLibUsb(libusb_get_config_descriptor(libusb_get_device(handle), 0, &configuration));
+    error = ErrorFromLibUsb(libusb_get_config_descriptor(libusb_get_device(handle_), 0, &configuration));
     if (error != Errors::Success) {
         return endpoints;
     }
@@ -118,23 +118,23 @@ std::vector<EndpointInfo> LibUsbDevice::Endpoints(ErrorCode& error) {
 }
 
 ErrorCode LibUsbDevice::Claim() {
-    const std::lock_guard lock(mutex);
-    if (claimed) {
+    const std::lock_guard lock(mutex_);
+    if (claimed_) {
         return Errors::Success;
     }
-    libusb_set_auto_detach_kernel_driver(handle, 1);
+    libusb_set_auto_detach_kernel_driver(handle_, 1);
     const auto patienceEnds = std::chrono::steady_clock::now() + ClaimPatience;
     for (;;) {
         int configuration = 0;
-        int result = libusb_get_configuration(handle, &configuration);
+        int result = libusb_get_configuration(handle_, &configuration);
         if (result == LIBUSB_SUCCESS && configuration != ConfigurationValue) {
-            result = libusb_set_configuration(handle, ConfigurationValue);
+            result = libusb_set_configuration(handle_, ConfigurationValue);
         }
         if (result == LIBUSB_SUCCESS) {
-            result = libusb_claim_interface(handle, InterfaceNumber);
+            result = libusb_claim_interface(handle_, InterfaceNumber);
         }
         if (result == LIBUSB_SUCCESS) {
-            claimed = true;
+            claimed_ = true;
             return Errors::Success;
         }
         if (result != LIBUSB_ERROR_NOT_FOUND || std::chrono::steady_clock::now() >= patienceEnds) {
@@ -145,20 +145,20 @@ ErrorCode LibUsbDevice::Claim() {
 }
 
 void LibUsbDevice::Release() {
-    const std::lock_guard lock(mutex);
-    if (claimed) {
-        libusb_release_interface(handle, InterfaceNumber);
-        claimed = false;
+    const std::lock_guard lock(mutex_);
+    if (claimed_) {
+        libusb_release_interface(handle_, InterfaceNumber);
+        claimed_ = false;
     }
 }
 
 std::unique_ptr<Submission> LibUsbDevice::TakeSpare() {
-    const std::lock_guard lock(mutex);
-    if (spare.empty()) {
+    const std::lock_guard lock(mutex_);
+    if (spare_.empty()) {
         return nullptr;
     }
-    std::unique_ptr<Submission> submission = std::move(spare.back());
-    spare.pop_back();
+    std::unique_ptr<Submission> submission = std::move(spare_.back());
+    spare_.pop_back();
     return submission;
 }
 
@@ -180,10 +180,10 @@ ErrorCode LibUsbDevice::Submit(Transfer& transfer) {
         if (!transfer.IsIn()) {
             std::copy_n(transfer.data, transfer.length, buffer.begin() + LIBUSB_CONTROL_SETUP_SIZE);
         }
-        libusb_fill_control_transfer(submission->transfer, handle, buffer.data(), &LibUsbDevice::Completed,
+        libusb_fill_control_transfer(submission->transfer, handle_, buffer.data(), &LibUsbDevice::Completed,
                                      submission.get(), 0);
     } else {
-        libusb_fill_bulk_transfer(submission->transfer, handle, transfer.endpoint, transfer.data,
+        libusb_fill_bulk_transfer(submission->transfer, handle_, transfer.endpoint, transfer.data,
                                   static_cast<int>(transfer.length), &LibUsbDevice::Completed,
                                   submission.get(), 0);
         if (transfer.endpoint == Protocol::InterruptInEndpoint) {
@@ -192,26 +192,26 @@ ErrorCode LibUsbDevice::Submit(Transfer& transfer) {
     }
 
     if (transfer.endpoint != Protocol::InterruptInEndpoint) {  // waited for at leisure
-        Posix::WorkOffInWaits(events);
+        Posix::WorkOffInWaits(events_);
     }
-    const std::lock_guard lock(mutex);
-    running.reserve(running.size() + 1);
-    spare.reserve(spare.size() + running.size() + 1);
+    const std::lock_guard lock(mutex_);
+    running_.reserve(running_.size() + 1);
+    spare_.reserve(spare_.size() + running_.size() + 1);
     const int result = libusb_submit_transfer(submission->transfer);
     if (result != LIBUSB_SUCCESS) {
-        spare.push_back(std::move(submission));
+        spare_.push_back(std::move(submission));
         return ErrorFromLibUsb(result);
     }
     transfer.deviceData = submission.get();
-    running.push_back(submission.release());
+    running_.push_back(submission.release());
     return Errors::Success;
 }
 
 void LibUsbDevice::Cancel(Transfer& transfer) {
-    const std::lock_guard lock(mutex);
+    const std::lock_guard lock(mutex_);
     if (auto* submission = static_cast<Submission*>(transfer.deviceData)) {
         libusb_cancel_transfer(submission->transfer);
-        events->HandleNow();
+        events_->HandleNow();
     }
 }
 
@@ -230,16 +230,16 @@ void LibUsbDevice::Complete(Submission& submission) {
                     transfer.data);
     }
     {
-        const std::lock_guard lock(mutex);
+        const std::lock_guard lock(mutex_);
         transfer.deviceData = nullptr;
-        std::erase(running, &submission);
-        spare.push_back(std::unique_ptr<Submission>(&submission));
-        ++completing;
+        std::erase(running_, &submission);
+        spare_.push_back(std::unique_ptr<Submission>(&submission));
+        ++completing_;
     }
     transfer.client->TransferCompleted(transfer);
-    const std::lock_guard lock(mutex);
-    --completing;
-    idle.notify_all();
+    const std::lock_guard lock(mutex_);
+    --completing_;
+    idle_.notify_all();
 }
 
 }  // namespace

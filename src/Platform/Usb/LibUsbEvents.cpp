@@ -20,67 +20,67 @@ constexpr auto LongestStay = std::chrono::seconds(60);
 
 }  // namespace
 
-LibUsbEvents::LibUsbEvents(libusb_context* ownContext) : context(ownContext) {
+LibUsbEvents::LibUsbEvents(libusb_context* ownContext) : context_(ownContext) {
     const Posix::HostSignalsBlocked blocked;
-    thread = std::thread([this] { RunThread(); });
+    thread_ = std::thread([this] { RunThread(); });
 }
 
 void LibUsbEvents::RunThread() {
-    std::unique_lock lock(mutex);
-    while (!stopping) {
-        if (!handlesAlways && waiterHandles) {
-            const auto isLeft = [this] { return !waiterHandles || handlesAlways || stopping; };
-            if (!changed.wait_for(lock, Patience, isLeft)) {  // who waits briefly need not wake this thread
-                threadAwaitsWaiter = true;
-                changed.wait(lock, isLeft);
-                threadAwaitsWaiter = false;
+    std::unique_lock lock(mutex_);
+    while (!stopping_) {
+        if (!handlesAlways_ && waiterHandles_) {
+            const auto isLeft = [this] { return !waiterHandles_ || handlesAlways_ || stopping_; };
+            if (!changed_.wait_for(lock, Patience, isLeft)) {  // who waits briefly need not wake this thread
+                threadAwaitsWaiter_ = true;
+                changed_.wait(lock, isLeft);
+                threadAwaitsWaiter_ = false;
             }
             continue;
         }
-        if (!handlesAlways && steady_clock::now() < leftToWaiters) {
-            changed.wait_until(lock, leftToWaiters);
+        if (!handlesAlways_ && steady_clock::now() < leftToWaiters_) {
+            changed_.wait_until(lock, leftToWaiters_);
             continue;
         }
-        threadHandles = true;
+        threadHandles_ = true;
         lock.unlock();
-        libusb_handle_events(context);
+        libusb_handle_events(context_);
         lock.lock();
-        threadHandles = false;
+        threadHandles_ = false;
     }
 }
 
 void LibUsbEvents::HandleNow() {
-    const std::lock_guard lock(mutex);
-    leftToWaiters = {};
-    changed.notify_all();
+    const std::lock_guard lock(mutex_);
+    leftToWaiters_ = {};
+    changed_.notify_all();
 }
 
 void LibUsbEvents::HandleAlways() {
-    const std::lock_guard lock(mutex);
-    handlesAlways = true;
-    changed.notify_all();
+    const std::lock_guard lock(mutex_);
+    handlesAlways_ = true;
+    changed_.notify_all();
 }
 
 void LibUsbEvents::Stop() {
-    std::unique_lock lock(mutex);
-    if (stopping) {
+    std::unique_lock lock(mutex_);
+    if (stopping_) {
         return;
     }
-    stopping = true;
-    changed.notify_all();
-    libusb_interrupt_event_handler(context);
-    changed.wait(lock, [this] { return !waiterHandles; });
+    stopping_ = true;
+    changed_.notify_all();
+    libusb_interrupt_event_handler(context_);
+    changed_.wait(lock, [this] { return !waiterHandles_; });
     lock.unlock();
-    thread.join();
+    thread_.join();
 }
 
 bool LibUsbEvents::TryEnter() {
-    const std::lock_guard lock(mutex);
-    if (waiterHandles || handlesAlways || stopping) {
+    const std::lock_guard lock(mutex_);
+    if (waiterHandles_ || handlesAlways_ || stopping_) {
         return false;
     }
-    waiterHandles = true;
-    interrupted = 0;
+    waiterHandles_ = true;
+    interrupted_ = 0;
     return true;
 }
 
@@ -92,26 +92,26 @@ void LibUsbEvents::WorkOff(Posix::Microseconds deadline) {
     time.tv_sec = static_cast<time_t>(stay / 1'000'000);
     time.tv_usec = static_cast<suseconds_t>(stay % 1'000'000);
     {
-        const std::lock_guard lock(mutex);
-        if (threadHandles) {
-            libusb_interrupt_event_handler(context);  // makes room; libusb waits for that
+        const std::lock_guard lock(mutex_);
+        if (threadHandles_) {
+            libusb_interrupt_event_handler(context_);  // makes room; libusb waits for that
         }
     }
-    libusb_handle_events_timeout_completed(context, &time, &interrupted);
+    libusb_handle_events_timeout_completed(context_, &time, &interrupted_);
 
-    const std::lock_guard lock(mutex);
-    waiterHandles = false;
-    leftToWaiters = steady_clock::now() + Patience;
-    if (stopping || handlesAlways || threadAwaitsWaiter) {
-        changed.notify_all();
+    const std::lock_guard lock(mutex_);
+    waiterHandles_ = false;
+    leftToWaiters_ = steady_clock::now() + Patience;
+    if (stopping_ || handlesAlways_ || threadAwaitsWaiter_) {
+        changed_.notify_all();
     }
 }
 
 void LibUsbEvents::Interrupt() {
-    const std::lock_guard lock(mutex);
-    interrupted = 1;
-    if (!stopping) {
-        libusb_interrupt_event_handler(context);
+    const std::lock_guard lock(mutex_);
+    interrupted_ = 1;
+    if (!stopping_) {
+        libusb_interrupt_event_handler(context_);
     }
 }
 

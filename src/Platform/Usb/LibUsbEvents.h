@@ -37,19 +37,19 @@ class LibUsbEvents final : public Posix::CompletionSource {
     using Time = std::chrono::steady_clock::time_point;
     void RunThread();
 
-    libusb_context* const context;
-    int interrupted = 0;  ///< read by libusb as well, between its own lock and its wait
+    libusb_context* const context_;
+    int interrupted_ = 0;  ///< read by libusb as well, between its own lock and its wait
 
-    std::mutex mutex;  ///< guards what follows
-    std::condition_variable changed;
-    bool threadHandles = false;
-    bool waiterHandles = false;
-    bool threadAwaitsWaiter = false;  ///< the own thread sleeps until the waiting thread leaves
-    Time leftToWaiters{};             ///< the own thread sleeps until then
-    bool handlesAlways = false;
-    bool stopping = false;
+    std::mutex mutex_;  ///< guards what follows
+    std::condition_variable changed_;
+    bool threadHandles_ = false;
+    bool waiterHandles_ = false;
+    bool threadAwaitsWaiter_ = false;  ///< the own thread sleeps until the waiting thread leaves
+    Time leftToWaiters_{};             ///< the own thread sleeps until then
+    bool handlesAlways_ = false;
+    bool stopping_ = false;
 
-    std::thread thread;
+    std::thread thread_;
 };
 
 }  // namespace Varnholt::Platform::Usb

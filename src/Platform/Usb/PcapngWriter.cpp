@@ -141,7 +141,7 @@ std::vector<std::uint8_t> UsbmonPacket(const PcapngWriter::Packet& packet, std::
 }  // namespace
 
 PcapngWriter::PcapngWriter(const std::string& fileName, const std::string& application)
-    : file(fileName, std::ios::binary | std::ios::trunc) {
+    : file_(fileName, std::ios::binary | std::ios::trunc) {
     Bytes section;
     section.Put32(ByteOrderMagic);
     section.Put16(1);  // version 1.0
@@ -157,7 +157,7 @@ PcapngWriter::PcapngWriter(const std::string& fileName, const std::string& appli
     interface.Put16(0);
     interface.Put32(0);  // packets are not cut; time stamps count microseconds where nothing else is said
     WriteBlock(InterfaceDescriptionBlock, interface.bytes);
-    file.flush();
+    file_.flush();
 }
 
 void PcapngWriter::Write(const Packet& packet) {
@@ -177,14 +177,14 @@ void PcapngWriter::Write(const Packet& packet) {
         block.PutOption(OptionComment, packet.comment);
         block.EndOptions();
     }
-    const std::lock_guard lock(mutex);
+    const std::lock_guard lock(mutex_);
     WriteBlock(EnhancedPacketBlock, block.bytes);
-    file.flush();
+    file_.flush();
 }
 
 bool PcapngWriter::Failed() const {
-    const std::lock_guard lock(mutex);
-    return !file;
+    const std::lock_guard lock(mutex_);
+    return !file_;
 }
 
 void PcapngWriter::WriteBlock(std::uint32_t type, std::span<const std::uint8_t> body) {
@@ -193,7 +193,7 @@ void PcapngWriter::WriteBlock(std::uint32_t type, std::span<const std::uint8_t> 
     Protocol::StoreLittle32(head.data(), type);
     Protocol::StoreLittle32(&head[4], length);
     const auto put = [this](std::span<const std::uint8_t> bytes) {
-        std::ranges::for_each(bytes, [this](std::uint8_t byte) { file.put(static_cast<char>(byte)); });
+        std::ranges::for_each(bytes, [this](std::uint8_t byte) { file_.put(static_cast<char>(byte)); });
     };
     put(head);
     put(body);

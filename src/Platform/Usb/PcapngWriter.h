@@ -33,8 +33,8 @@ class PcapngWriter final {
   private:
     void WriteBlock(std::uint32_t type, std::span<const std::uint8_t> body);
 
-    mutable std::mutex mutex;  // guards the file
-    std::ofstream file;
+    mutable std::mutex mutex_;  // guards the file
+    std::ofstream file_;
 };
 
 }  // namespace Varnholt::Platform::Usb

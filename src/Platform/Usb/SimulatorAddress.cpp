@@ -19,15 +19,16 @@ class Address final {
     explicit Address(const std::string& name) {
         // A leading zero makes the name an abstract one, which is as long as the address says.
         const std::string path = SimulatorSocketPrefix + name;
-        address.sun_family = AF_UNIX;
-        std::copy_n(path.begin(), std::min(path.size(), sizeof(address.sun_path) - 1), address.sun_path + 1);
-        size = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + 1 + path.size());
+        address_.sun_family = AF_UNIX;
+        std::copy_n(path.begin(), std::min(path.size(), sizeof(address_.sun_path) - 1),
+                    address_.sun_path + 1);
+        size_ = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + 1 + path.size());
     }
 
     int MakeSocket(int (*use)(int, const sockaddr*, socklen_t)) const {
         // Never waits: a connection is there at once, or the simulator has stopped taking them.
         const int file = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
-        if (file >= 0 && use(file, reinterpret_cast<const sockaddr*>(&address), size) != 0) {
+        if (file >= 0 && use(file, reinterpret_cast<const sockaddr*>(&address_), size_) != 0) {
             const int error = errno;
             close(file);
             errno = error;
@@ -37,8 +38,8 @@ class Address final {
     }
 
   private:
-    sockaddr_un address{};
-    socklen_t size = 0;
+    sockaddr_un address_{};
+    socklen_t size_ = 0;
 };
 
 }  // namespace

@@ -126,11 +126,11 @@ void AskForUser(const std::string& name, SimulatorInfo& info) {
 class SimulatorsOfThisUser final : public UsbBus {
   public:
     std::vector<std::string> List() override {
-        const std::lock_guard lock(mutex);
+        const std::lock_guard lock(mutex_);
         std::map<std::string, std::uint32_t> users;
         std::vector<std::string> names;
         for (const auto& [name, socket] : ListeningSockets()) {
-            if (const auto known = userBySocket.find(socket); known != userBySocket.end()) {
+            if (const auto known = userBySocket_.find(socket); known != userBySocket_.end()) {
                 users.insert(*known);
             } else if (const auto info = Describe(name)) {
                 users[socket] = info->userId;
@@ -139,7 +139,7 @@ class SimulatorsOfThisUser final : public UsbBus {
                 names.push_back(SimulatedPrefix + name);
             }
         }
-        userBySocket = std::move(users);
+        userBySocket_ = std::move(users);
         return names;
     }
 
@@ -160,8 +160,8 @@ class SimulatorsOfThisUser final : public UsbBus {
     }
 
   private:
-    std::mutex mutex;                                   // guards what follows
-    std::map<std::string, std::uint32_t> userBySocket;  // of those that listened the last time
+    std::mutex mutex_;                                   // guards what follows
+    std::map<std::string, std::uint32_t> userBySocket_;  // of those that listened the last time
 };
 
 }  // namespace

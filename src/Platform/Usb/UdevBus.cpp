@@ -174,22 +174,22 @@ class UdevBus final : public UsbBus {
 
   private:
     std::vector<UsbDeviceInfo> Present() {
-        const std::lock_guard lock(mutex);
+        const std::lock_guard lock(mutex_);
         const std::optional<std::int64_t> changed = LastChangeOfUdev();
-        if (!keptSince || keptSince != changed) {
-            kept = ListRegisteredDevices();
-            keptSince = changed && IsSettled(*changed) ? changed : std::nullopt;
+        if (!keptSince_ || keptSince_ != changed) {
+            kept_ = ListRegisteredDevices();
+            keptSince_ = changed && IsSettled(*changed) ? changed : std::nullopt;
         }
         std::vector<UsbDeviceInfo> present;
-        std::ranges::copy_if(kept, std::back_inserter(present), [](const UsbDeviceInfo& device) {
+        std::ranges::copy_if(kept_, std::back_inserter(present), [](const UsbDeviceInfo& device) {
             return access(device.deviceNode.c_str(), F_OK) == 0;  // unplugged, and udev did not get to it yet
         });
         return present;
     }
 
-    std::mutex mutex;  // guards what follows
-    std::vector<UsbDeviceInfo> kept;
-    std::optional<std::int64_t> keptSince;
+    std::mutex mutex_;  // guards what follows
+    std::vector<UsbDeviceInfo> kept_;
+    std::optional<std::int64_t> keptSince_;
 };
 
 }  // namespace

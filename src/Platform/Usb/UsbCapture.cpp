@@ -22,16 +22,16 @@ std::string Comment(const Transfer& transfer, bool completion) {
 class CapturedDevice final : public InterceptingDevice {
   public:
     CapturedDevice(std::shared_ptr<UsbDevice> recordedDevice, PcapngWriter& recorder, std::uint8_t number)
-        : InterceptingDevice(std::move(recordedDevice)), writer(recorder), deviceNumber(number) {}
+        : InterceptingDevice(std::move(recordedDevice)), writer_(recorder), deviceNumber_(number) {}
     ~CapturedDevice() override { Detach(); }
 
   private:
     void BeforeSubmit(std::uint64_t id, Transfer& transfer) override {
-        writer.Write({id, false, deviceNumber, &transfer, Comment(transfer, false)});
+        writer_.Write({id, false, deviceNumber_, &transfer, Comment(transfer, false)});
     }
     void AfterCompletion(std::uint64_t id, Transfer& transfer) noexcept override {
         try {
-            writer.Write({id, true, deviceNumber, &transfer, Comment(transfer, true)});
+            writer_.Write({id, true, deviceNumber_, &transfer, Comment(transfer, true)});
         } catch (...) {  // no memory for the packet: the traffic goes on unrecorded
         }
     }
@@ -42,8 +42,8 @@ class CapturedDevice final : public InterceptingDevice {
         AfterCompletion(id, transfer);
     }
 
-    PcapngWriter& writer;
-    const std::uint8_t deviceNumber;
+    PcapngWriter& writer_;
+    const std::uint8_t deviceNumber_;
 };
 
 }  // namespace
@@ -55,16 +55,16 @@ std::shared_ptr<UsbDevice> CaptureDevice(std::shared_ptr<UsbDevice> device, Pcap
 
 std::shared_ptr<UsbDevice> CapturingBus::Open(const std::string& name, ErrorCode& error) {
     constexpr std::uint8_t highestDeviceNumber = 127;
-    std::shared_ptr<UsbDevice> device = bus.Open(name, error);
+    std::shared_ptr<UsbDevice> device = bus_.Open(name, error);
     if (!device) {
         return nullptr;
     }
-    const auto known = std::ranges::find(names, name);
-    const auto number = static_cast<std::size_t>(known - names.begin()) + 1;
-    if (known == names.end()) {
-        names.push_back(name);
+    const auto known = std::ranges::find(names_, name);
+    const auto number = static_cast<std::size_t>(known - names_.begin()) + 1;
+    if (known == names_.end()) {
+        names_.push_back(name);
     }
-    return CaptureDevice(std::move(device), writer,
+    return CaptureDevice(std::move(device), writer_,
                          static_cast<std::uint8_t>(std::min<std::size_t>(number, highestDeviceNumber)));
 }
 

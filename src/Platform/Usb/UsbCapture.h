@@ -17,15 +17,15 @@ std::shared_ptr<UsbDevice> CaptureDevice(std::shared_ptr<UsbDevice> device, Pcap
 /// A bus whose devices are all recorded. `bus` and `writer` must outlive it.
 class CapturingBus final : public UsbBus {
   public:
-    CapturingBus(UsbBus& recordedBus, PcapngWriter& recorder) : bus(recordedBus), writer(recorder) {}
+    CapturingBus(UsbBus& recordedBus, PcapngWriter& recorder) : bus_(recordedBus), writer_(recorder) {}
 
-    std::vector<std::string> List() override { return bus.List(); }
+    std::vector<std::string> List() override { return bus_.List(); }
     std::shared_ptr<UsbDevice> Open(const std::string& name, ErrorCode& error) override;
 
   private:
-    UsbBus& bus;
-    PcapngWriter& writer;
-    std::vector<std::string> names;  // an instrument keeps its device number when it is opened again
+    UsbBus& bus_;
+    PcapngWriter& writer_;
+    std::vector<std::string> names_;  // an instrument keeps its device number when it is opened again
 };
 
 }  // namespace Varnholt::Platform::Usb

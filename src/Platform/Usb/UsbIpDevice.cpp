@@ -38,12 +38,12 @@ class WaitedTransfer final : public Transfer, private TransferClient {
         if (const ErrorCode code = device.Submit(*this); code != Errors::Success) {
             return code;
         }
-        std::unique_lock lock(mutex);
-        if (!completion.wait_for(lock, RequestPatience, [this] { return completed; })) {
+        std::unique_lock lock(mutex_);
+        if (!completion_.wait_for(lock, RequestPatience, [this] { return completed_; })) {
             lock.unlock();
             device.Cancel(*this);
             lock.lock();
-            completion.wait(lock, [this] { return completed; });
+            completion_.wait(lock, [this] { return completed_; });
         }
         switch (status) {
             case TransferStatus::Completed:
@@ -59,20 +59,20 @@ class WaitedTransfer final : public Transfer, private TransferClient {
 
   private:
     void TransferCompleted(Transfer&) noexcept override {
-        const std::lock_guard lock(mutex);
-        completed = true;
-        completion.notify_all();
+        const std::lock_guard lock(mutex_);
+        completed_ = true;
+        completion_.notify_all();
     }
 
-    std::mutex mutex;
-    std::condition_variable completion;
-    bool completed = false;
+    std::mutex mutex_;
+    std::condition_variable completion_;
+    bool completed_ = false;
 };
 
 class UsbIpDevice final : public UsbDevice {
   public:
     UsbIpDevice(UsbIpConnector connector, std::string id)
-        : connect(std::move(connector)), busId(std::move(id)) {}
+        : connect_(std::move(connector)), busId_(std::move(id)) {}
     ~UsbIpDevice() override { Release(); }
 
     std::vector<EndpointInfo> Endpoints(ErrorCode& error) override;
@@ -96,75 +96,75 @@ class UsbIpDevice final : public UsbDevice {
     static void Complete(Transfer& transfer, TransferStatus status, std::uint32_t actualLength);
 
     // Called with `mutex` held.
-    std::uint32_t NextSequence() { return ++lastSequence == 0 ? ++lastSequence : lastSequence; }
+    std::uint32_t NextSequence() { return ++lastSequence_ == 0 ? ++lastSequence_ : lastSequence_; }
     void LimitReceiving();
 
-    const UsbIpConnector connect;
-    const std::string busId;
+    const UsbIpConnector connect_;
+    const std::string busId_;
 
     bool Claimed();
 
-    std::mutex claimMutex;  // taken first; held while what follows changes
-    std::unique_ptr<UsbIpSocket> socket;
-    std::uint32_t deviceId = 0;
-    std::thread reader;
-    std::vector<EndpointInfo> endpoints;
+    std::mutex claimMutex_;  // taken first; held while what follows changes
+    std::unique_ptr<UsbIpSocket> socket_;
+    std::uint32_t deviceId_ = 0;
+    std::thread reader_;
+    std::vector<EndpointInfo> endpoints_;
 
-    std::mutex sendMutex;  // taken second: packets leave in the order in which they are entered below
-    std::mutex mutex;      // taken last; guards what follows
-    std::vector<Running> running;
-    std::uint32_t lastSequence = 0;
-    bool connected = false;
-    std::optional<Clock::time_point> releaseLimit;  // set while the claim is being given back
+    std::mutex sendMutex_;  // taken second: packets leave in the order in which they are entered below
+    std::mutex mutex_;      // taken last; guards what follows
+    std::vector<Running> running_;
+    std::uint32_t lastSequence_ = 0;
+    bool connected_ = false;
+    std::optional<Clock::time_point> releaseLimit_;  // set while the claim is being given back
 };
 
 ErrorCode UsbIpDevice::Claim() {
-    const std::lock_guard claimLock(claimMutex);
-    if (socket) {
-        const std::lock_guard lock(mutex);
-        return connected ? Errors::Success : Errors::DeviceNotConnected;
+    const std::lock_guard claimLock(claimMutex_);
+    if (socket_) {
+        const std::lock_guard lock(mutex_);
+        return connected_ ? Errors::Success : Errors::DeviceNotConnected;
     }
     ErrorCode error = Errors::Success;
-    std::unique_ptr<UsbIpSocket> newSocket = ConnectUsbIp(connect, error);
+    std::unique_ptr<UsbIpSocket> newSocket = ConnectUsbIp(connect_, error);
     if (!newSocket) {
         return error;
     }
-    if (error = ImportUsbIpDevice(*newSocket, busId, deviceId); error != Errors::Success) {
+    if (error = ImportUsbIpDevice(*newSocket, busId_, deviceId_); error != Errors::Success) {
         return error;
     }
-    socket = std::move(newSocket);
+    socket_ = std::move(newSocket);
     {
-        const std::lock_guard lock(mutex);
-        connected = true;
-        releaseLimit.reset();
+        const std::lock_guard lock(mutex_);
+        connected_ = true;
+        releaseLimit_.reset();
     }
     try {
         const Posix::HostSignalsBlocked blocked;
-        reader = std::thread([this] { Listen(); });
+        reader_ = std::thread([this] { Listen(); });
     } catch (const std::exception&) {  // no thread, or no memory for it
-        socket.reset();
-        const std::lock_guard lock(mutex);
-        connected = false;
+        socket_.reset();
+        const std::lock_guard lock(mutex_);
+        connected_ = false;
         error = Errors::NoSystemResources;
     }
     return error;
 }
 
 void UsbIpDevice::Release() {
-    const std::lock_guard claimLock(claimMutex);
-    if (!socket) {
+    const std::lock_guard claimLock(claimMutex_);
+    if (!socket_) {
         return;
     }
     {
-        const std::lock_guard lock(mutex);
-        releaseLimit = Clock::now() + ClosePatience;
+        const std::lock_guard lock(mutex_);
+        releaseLimit_ = Clock::now() + ClosePatience;
         LimitReceiving();
     }
     // Once the peer has closed its end, too, the device is free for the next who wants it.
-    socket->ShutdownSending();
-    reader.join();
-    const std::lock_guard sendLock(sendMutex);  // nobody is sending any more
-    socket.reset();
+    socket_->ShutdownSending();
+    reader_.join();
+    const std::lock_guard sendLock(sendMutex_);  // nobody is sending any more
+    socket_.reset();
 }
 
 ErrorCode UsbIpDevice::Submit(Transfer& transfer) try {
@@ -177,20 +177,20 @@ ErrorCode UsbIpDevice::Submit(Transfer& transfer) try {
     packet.length = transfer.length;
     packet.setup = transfer.endpoint == 0 ? transfer.setup : SetupPacket{};
 
-    const std::lock_guard sendLock(sendMutex);
+    const std::lock_guard sendLock(sendMutex_);
     {
-        const std::lock_guard lock(mutex);
-        if (!connected || releaseLimit) {
+        const std::lock_guard lock(mutex_);
+        if (!connected_ || releaseLimit_) {
             return Errors::DeviceNotConnected;
         }
         packet.sequence = NextSequence();
         transfer.actualLength = 0;
-        running.push_back({&transfer, packet.sequence});
+        running_.push_back({&transfer, packet.sequence});
     }
-    packet.deviceId = deviceId;
+    packet.deviceId = deviceId_;
     const std::span<const std::uint8_t> payload(transfer.data, packet.in ? 0 : packet.length);
-    if (!socket->Send(UsbIp::Encode(packet), payload)) {
-        socket->Shutdown();  // the reader ends every transfer, this one too
+    if (!socket_->Send(UsbIp::Encode(packet), payload)) {
+        socket_->Shutdown();  // the reader ends every transfer, this one too
     }
     return Errors::Success;
 } catch (const std::bad_alloc&) {
@@ -198,12 +198,12 @@ ErrorCode UsbIpDevice::Submit(Transfer& transfer) try {
 }
 
 void UsbIpDevice::Cancel(Transfer& transfer) {
-    const std::lock_guard sendLock(sendMutex);
+    const std::lock_guard sendLock(sendMutex_);
     UsbIp::UnlinkPacket packet;
     {
-        const std::lock_guard lock(mutex);
-        const auto found = std::ranges::find(running, &transfer, &Running::transfer);
-        if (found == running.end() || found->unlinkSequence != 0) {
+        const std::lock_guard lock(mutex_);
+        const auto found = std::ranges::find(running_, &transfer, &Running::transfer);
+        if (found == running_.end() || found->unlinkSequence != 0) {
             return;
         }
         packet.sequence = found->unlinkSequence = NextSequence();
@@ -211,20 +211,20 @@ void UsbIpDevice::Cancel(Transfer& transfer) {
         found->unlinkLimit = Clock::now() + UnlinkPatience;
         LimitReceiving();
     }
-    packet.deviceId = deviceId;
-    if (!socket->Send(UsbIp::Encode(packet), {})) {
-        socket->Shutdown();
+    packet.deviceId = deviceId_;
+    if (!socket_->Send(UsbIp::Encode(packet), {})) {
+        socket_->Shutdown();
     }
 }
 
 void UsbIpDevice::LimitReceiving() {
-    std::optional<Clock::time_point> limit = releaseLimit;
-    for (const Running& each : running) {
+    std::optional<Clock::time_point> limit = releaseLimit_;
+    for (const Running& each : running_) {
         if (each.transfer && each.unlinkSequence != 0 && (!limit || each.unlinkLimit < *limit)) {
             limit = each.unlinkLimit;
         }
     }
-    socket->ReceiveUntil(limit);
+    socket_->ReceiveUntil(limit);
 }
 
 void UsbIpDevice::Listen() {
@@ -235,20 +235,20 @@ void UsbIpDevice::Listen() {
         return false;
     };
     UsbIp::PacketBytes bytes{};
-    while (socket->Receive(bytes, false)) {
+    while (socket_->Receive(bytes, false)) {
         const auto packet = UsbIp::DecodePacket(bytes);
         if (!packet || !std::visit(handle, *packet)) {
             break;
         }
     }
-    socket->Shutdown();
+    socket_->Shutdown();
     std::vector<Running> left;
     TransferStatus status = TransferStatus::DeviceGone;
     {
-        const std::lock_guard lock(mutex);
-        connected = false;
-        left.swap(running);
-        status = releaseLimit ? TransferStatus::Cancelled : TransferStatus::DeviceGone;
+        const std::lock_guard lock(mutex_);
+        connected_ = false;
+        left.swap(running_);
+        status = releaseLimit_ ? TransferStatus::Cancelled : TransferStatus::DeviceGone;
     }
     for (const Running& each : left) {
         if (each.transfer) {
@@ -261,22 +261,22 @@ void UsbIpDevice::Listen() {
 bool UsbIpDevice::HandleReply(const UsbIp::SubmitReply& reply) {
     Transfer* transfer = nullptr;
     {
-        const std::lock_guard lock(mutex);
-        const auto found = std::ranges::find(running, reply.sequence, &Running::sequence);
-        if (found == running.end() || !found->transfer) {
+        const std::lock_guard lock(mutex_);
+        const auto found = std::ranges::find(running_, reply.sequence, &Running::sequence);
+        if (found == running_.end() || !found->transfer) {
             return false;
         }
         transfer = found->transfer;
     }
     if (reply.actualLength > transfer->length ||
-        (transfer->IsIn() && !socket->Receive({transfer->data, reply.actualLength}, true))) {
+        (transfer->IsIn() && !socket_->Receive({transfer->data, reply.actualLength}, true))) {
         return false;
     }
     {
-        const std::lock_guard lock(mutex);
-        const auto found = std::ranges::find(running, reply.sequence, &Running::sequence);
+        const std::lock_guard lock(mutex_);
+        const auto found = std::ranges::find(running_, reply.sequence, &Running::sequence);
         if (found->unlinkSequence == 0) {
-            running.erase(found);
+            running_.erase(found);
         } else {
             found->transfer = nullptr;
         }
@@ -289,13 +289,13 @@ bool UsbIpDevice::HandleReply(const UsbIp::SubmitReply& reply) {
 bool UsbIpDevice::HandleReply(const UsbIp::UnlinkReply& reply) {
     Transfer* transfer = nullptr;
     {
-        const std::lock_guard lock(mutex);
-        const auto found = std::ranges::find(running, reply.sequence, &Running::unlinkSequence);
-        if (found == running.end() || reply.sequence == 0) {
+        const std::lock_guard lock(mutex_);
+        const auto found = std::ranges::find(running_, reply.sequence, &Running::unlinkSequence);
+        if (found == running_.end() || reply.sequence == 0) {
             return false;
         }
         transfer = found->transfer;
-        running.erase(found);
+        running_.erase(found);
         LimitReceiving();
     }
     if (transfer) {
@@ -313,9 +313,9 @@ void UsbIpDevice::Complete(Transfer& transfer, TransferStatus status, std::uint3
 std::vector<EndpointInfo> UsbIpDevice::Endpoints(ErrorCode& error) {
     error = Errors::Success;
     {
-        const std::lock_guard claimLock(claimMutex);
-        if (!endpoints.empty()) {
-            return endpoints;
+        const std::lock_guard claimLock(claimMutex_);
+        if (!endpoints_.empty()) {
+            return endpoints_;
         }
     }
     // The descriptors come over the connection, which there is only during a claim.
@@ -337,14 +337,14 @@ std::vector<EndpointInfo> UsbIpDevice::Endpoints(ErrorCode& error) {
             Release();
         }
     }
-    const std::lock_guard claimLock(claimMutex);
-    endpoints = found;
+    const std::lock_guard claimLock(claimMutex_);
+    endpoints_ = found;
     return found;
 }
 
 bool UsbIpDevice::Claimed() {
-    const std::lock_guard claimLock(claimMutex);
-    return socket != nullptr;
+    const std::lock_guard claimLock(claimMutex_);
+    return socket_ != nullptr;
 }
 
 ErrorCode UsbIpDevice::ClearHalt(std::uint8_t endpoint) {

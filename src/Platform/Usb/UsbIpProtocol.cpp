@@ -11,20 +11,20 @@ namespace {
 template <class Byte>
 class Cursor {
   protected:
-    explicit Cursor(std::span<Byte> message) : rest(message) {}
+    explicit Cursor(std::span<Byte> message) : rest_(message) {}
 
     std::span<Byte> Take(std::size_t size) {
-        if (size > rest.size()) {
-            rest = {};
+        if (size > rest_.size()) {
+            rest_ = {};
             return {};
         }
-        const auto field = rest.first(size);
-        rest = rest.subspan(size);
+        const auto field = rest_.first(size);
+        rest_ = rest_.subspan(size);
         return field;
     }
 
   private:
-    std::span<Byte> rest;
+    std::span<Byte> rest_;
 };
 
 class Writer final : Cursor<std::uint8_t> {

@@ -23,32 +23,32 @@ int MillisecondsUntil(UsbIpSocket::Clock::time_point time) {
 
 }  // namespace
 
-UsbIpSocket::UsbIpSocket(int socketFile) : file(socketFile), wake(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {}
+UsbIpSocket::UsbIpSocket(int socketFile) : file_(socketFile), wake_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {}
 
 UsbIpSocket::~UsbIpSocket() {
-    close(file);
-    if (wake >= 0) {
-        close(wake);
+    close(file_);
+    if (wake_ >= 0) {
+        close(wake_);
     }
 }
 
 void UsbIpSocket::ShutdownSending() {
-    shutdown(file, SHUT_WR);
+    shutdown(file_, SHUT_WR);
 }
 
 void UsbIpSocket::Shutdown() {
-    shutdown(file, SHUT_RDWR);
+    shutdown(file_, SHUT_RDWR);
 }
 
 void UsbIpSocket::ReceiveUntil(std::optional<Clock::time_point> time) {
     {
-        const std::lock_guard lock(mutex);
-        if (limit == time) {
+        const std::lock_guard lock(mutex_);
+        if (limit_ == time) {
             return;
         }
-        limit = time;
+        limit_ = time;
     }
-    eventfd_write(wake, 1);
+    eventfd_write(wake_, 1);
 }
 
 bool UsbIpSocket::Send(std::span<const std::uint8_t> header, std::span<const std::uint8_t> payload) {
@@ -64,7 +64,7 @@ bool UsbIpSocket::Send(std::span<const std::uint8_t> header, std::span<const std
         msghdr message{};
         message.msg_iov = parts.data();
         message.msg_iovlen = count;
-        const ssize_t sent = sendmsg(file, &message, MSG_NOSIGNAL | MSG_DONTWAIT);
+        const ssize_t sent = sendmsg(file_, &message, MSG_NOSIGNAL | MSG_DONTWAIT);
         if (sent > 0) {
             const std::size_t ofHeader = std::min(header.size(), static_cast<std::size_t>(sent));
             header = header.subspan(ofHeader);
@@ -78,7 +78,7 @@ bool UsbIpSocket::Send(std::span<const std::uint8_t> header, std::span<const std
         if (sent < 0 && errno != EAGAIN) {
             return false;
         }
-        pollfd state{file, POLLOUT, 0};
+        pollfd state{file_, POLLOUT, 0};
         if (poll(&state, 1, MillisecondsUntil(patienceEnds)) == 0 && Clock::now() >= patienceEnds) {
             return false;
         }
@@ -87,7 +87,7 @@ bool UsbIpSocket::Send(std::span<const std::uint8_t> header, std::span<const std
 }
 
 bool UsbIpSocket::Receive(std::span<std::uint8_t> bytes, bool inMessage) {
-    if (wake < 0) {
+    if (wake_ < 0) {
         return false;  // waits could not be ended in time
     }
     std::optional<Clock::time_point> patienceEnds;
@@ -95,22 +95,22 @@ bool UsbIpSocket::Receive(std::span<std::uint8_t> bytes, bool inMessage) {
         patienceEnds = Clock::now() + Patience;
     }
     while (!bytes.empty()) {
-        if (bufferStart < bufferEnd) {
-            const std::size_t count = std::min(bytes.size(), bufferEnd - bufferStart);
-            std::memcpy(bytes.data(), &buffer[bufferStart], count);
-            bufferStart += count;
+        if (bufferStart_ < bufferEnd_) {
+            const std::size_t count = std::min(bytes.size(), bufferEnd_ - bufferStart_);
+            std::memcpy(bytes.data(), &buffer_[bufferStart_], count);
+            bufferStart_ += count;
             bytes = bytes.subspan(count);
             continue;
         }
-        const bool direct = bytes.size() >= buffer.size();
-        const ssize_t received = direct ? recv(file, bytes.data(), bytes.size(), MSG_DONTWAIT)
-                                        : recv(file, buffer.data(), buffer.size(), MSG_DONTWAIT);
+        const bool direct = bytes.size() >= buffer_.size();
+        const ssize_t received = direct ? recv(file_, bytes.data(), bytes.size(), MSG_DONTWAIT)
+                                        : recv(file_, buffer_.data(), buffer_.size(), MSG_DONTWAIT);
         if (received > 0) {
             if (direct) {
                 bytes = bytes.subspan(static_cast<std::size_t>(received));
             } else {
-                bufferStart = 0;
-                bufferEnd = static_cast<std::size_t>(received);
+                bufferStart_ = 0;
+                bufferEnd_ = static_cast<std::size_t>(received);
             }
             const auto now = Clock::now();
             if (LimitIsBefore(now)) {
@@ -130,27 +130,27 @@ bool UsbIpSocket::Receive(std::span<std::uint8_t> bytes, bool inMessage) {
 }
 
 bool UsbIpSocket::LimitIsBefore(Clock::time_point time) {
-    const std::lock_guard lock(mutex);
-    return limit && *limit < time;
+    const std::lock_guard lock(mutex_);
+    return limit_ && *limit_ < time;
 }
 
 UsbIpSocket::Readiness UsbIpSocket::WaitToReceive(std::optional<Clock::time_point> patienceEnds) {
     for (;;) {
         std::optional<Clock::time_point> end = patienceEnds;
         {
-            const std::lock_guard lock(mutex);
-            if (limit && (!end || *limit < *end)) {
-                end = limit;
+            const std::lock_guard lock(mutex_);
+            if (limit_ && (!end || *limit_ < *end)) {
+                end = limit_;
             }
         }
-        std::array<pollfd, 2> states{pollfd{file, POLLIN, 0}, pollfd{wake, POLLIN, 0}};
+        std::array<pollfd, 2> states{pollfd{file_, POLLIN, 0}, pollfd{wake_, POLLIN, 0}};
         const int ready = poll(states.data(), states.size(), end ? MillisecondsUntil(*end) : -1);
         if (states[0].revents != 0) {
             return Readiness::Ready;
         }
         if (ready > 0) {
             eventfd_t count = 0;
-            eventfd_read(wake, &count);
+            eventfd_read(wake_, &count);
         } else if (end && Clock::now() >= *end) {
             return Readiness::Lost;
         }

@@ -41,16 +41,16 @@ class UsbIpSocket final {
     bool LimitIsBefore(Clock::time_point time);
     Readiness WaitToReceive(std::optional<Clock::time_point> patienceEnds);
 
-    const int file;
-    const int wake;  // readable when `limit` has changed
+    const int file_;
+    const int wake_;  // readable when `limit` has changed
 
-    std::mutex mutex;  // guards `limit`
-    std::optional<Clock::time_point> limit;
+    std::mutex mutex_;  // guards `limit`
+    std::optional<Clock::time_point> limit_;
 
     // Bytes received and not asked for yet; small messages then take one call of the system.
-    std::array<std::uint8_t, 4096> buffer{};
-    std::size_t bufferStart = 0;
-    std::size_t bufferEnd = 0;
+    std::array<std::uint8_t, 4096> buffer_{};
+    std::size_t bufferStart_ = 0;
+    std::size_t bufferEnd_ = 0;
 };
 
 }  // namespace Varnholt::Platform::Usb

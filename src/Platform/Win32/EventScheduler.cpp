@@ -23,11 +23,11 @@ class RealTimeScheduler final : public EventScheduler {
     }
 
     EventId CallAt(std::uint64_t time, std::function<void()> event) override {
-        const std::lock_guard held(lock);
-        const EventId id = ++lastId;
-        waiting.emplace(std::pair(time, id), std::move(event));
-        if (threadRuns) {
-            changed.notify_all();
+        const std::lock_guard held(lock_);
+        const EventId id = ++lastId_;
+        waiting_.emplace(std::pair(time, id), std::move(event));
+        if (threadRuns_) {
+            changed_.notify_all();
         } else {
             StartThread();
         }
@@ -36,16 +36,16 @@ class RealTimeScheduler final : public EventScheduler {
 
     void Forget(EventId id) override {
         Event dropped;  // what it holds may be anything: it goes without the lock
-        std::unique_lock held(lock);
+        std::unique_lock held(lock_);
         const auto found =
-            std::ranges::find_if(waiting, [id](const auto& entry) { return entry.first.second == id; });
-        if (found != waiting.end()) {
+            std::ranges::find_if(waiting_, [id](const auto& entry) { return entry.first.second == id; });
+        if (found != waiting_.end()) {
             dropped = std::move(found->second);
-            waiting.erase(found);
-            changed.notify_all();
+            waiting_.erase(found);
+            changed_.notify_all();
         }
-        if (std::this_thread::get_id() != thread.get_id()) {
-            changed.wait(held, [this, id] { return inCall != id; });
+        if (std::this_thread::get_id() != thread_.get_id()) {
+            changed_.wait(held, [this, id] { return inCall_ != id; });
         }
         held.unlock();
     }
@@ -55,46 +55,46 @@ class RealTimeScheduler final : public EventScheduler {
     using Event = std::function<void()>;
 
     void StartThread() {
-        if (thread.joinable()) {
-            thread.join();  // it has seen that nothing was waiting, and takes the lock no more
+        if (thread_.joinable()) {
+            thread_.join();  // it has seen that nothing was waiting, and takes the lock no more
         }
         try {
-            thread = std::thread([this] { Run(); });
-            threadRuns = true;
+            thread_ = std::thread([this] { Run(); });
+            threadRuns_ = true;
         } catch (const std::system_error&) {
             // Without a thread the events wait for the next call that can have one: late, but not lost.
         }
     }
 
     void Run() {
-        std::unique_lock held(lock);
-        while (!waiting.empty()) {
-            const auto first = waiting.begin();
+        std::unique_lock held(lock_);
+        while (!waiting_.empty()) {
+            const auto first = waiting_.begin();
             const auto [time, id] = first->first;
             if (time > Now()) {
-                changed.wait_for(held, std::chrono::microseconds(time - Now()));
+                changed_.wait_for(held, std::chrono::microseconds(time - Now()));
                 continue;
             }
             Event event = std::move(first->second);
-            waiting.erase(first);
-            inCall = id;
+            waiting_.erase(first);
+            inCall_ = id;
             held.unlock();
             event();
             event = nullptr;
             held.lock();
-            inCall = 0;
-            changed.notify_all();
+            inCall_ = 0;
+            changed_.notify_all();
         }
-        threadRuns = false;
+        threadRuns_ = false;
     }
 
-    std::mutex lock;  // guards all below; nothing else is called while it is held
-    std::condition_variable changed;
-    std::map<std::pair<std::uint64_t, EventId>, Event> waiting;  // by time, then in order of asking
-    EventId lastId = 0;
-    EventId inCall = 0;
-    bool threadRuns = false;
-    std::thread thread;
+    std::mutex lock_;  // guards all below; nothing else is called while it is held
+    std::condition_variable changed_;
+    std::map<std::pair<std::uint64_t, EventId>, Event> waiting_;  // by time, then in order of asking
+    EventId lastId_ = 0;
+    EventId inCall_ = 0;
+    bool threadRuns_ = false;
+    std::thread thread_;
 };
 
 }  // namespace

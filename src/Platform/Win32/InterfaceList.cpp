@@ -29,48 +29,48 @@ SP_DEVICE_INTERFACE_DATA SystemRecord(const InterfaceRecord& record) {
 class SetupApiList final : public InterfaceList {
   public:
     SetupApiList(const SetupApi::EntryPoints& entryPoints, HDEVINFO deviceInfo)
-        : api(entryPoints), list(deviceInfo) {}
-    ~SetupApiList() override { api.destroyDeviceInfoList(list); }
+        : api_(entryPoints), list_(deviceInfo) {}
+    ~SetupApiList() override { api_.destroyDeviceInfoList(list_); }
 
     bool Find(const Protocol::Guid& interfaceClass, std::uint32_t index, InterfaceRecord& record) override {
-        return api.enumDeviceInterfaces(list, nullptr, SystemGuid(interfaceClass), index,
-                                        reinterpret_cast<SP_DEVICE_INTERFACE_DATA*>(&record)) != 0;
+        return api_.enumDeviceInterfaces(list_, nullptr, SystemGuid(interfaceClass), index,
+                                         reinterpret_cast<SP_DEVICE_INTERFACE_DATA*>(&record)) != 0;
     }
 
     std::uint32_t DetailSize(const InterfaceRecord& record) override {
         SP_DEVICE_INTERFACE_DATA systemRecord = SystemRecord(record);
         DWORD size = 0;
-        api.getDeviceInterfaceDetail(list, &systemRecord, nullptr, 0, &size, nullptr);
+        api_.getDeviceInterfaceDetail(list_, &systemRecord, nullptr, 0, &size, nullptr);
         return size;
     }
 
     bool ReadDetail(const InterfaceRecord& record, std::span<std::byte> detail) override {
         SP_DEVICE_INTERFACE_DATA systemRecord = SystemRecord(record);
-        return api.getDeviceInterfaceDetail(
-                   list, &systemRecord, reinterpret_cast<SP_DEVICE_INTERFACE_DETAIL_DATA_A*>(detail.data()),
+        return api_.getDeviceInterfaceDetail(
+                   list_, &systemRecord, reinterpret_cast<SP_DEVICE_INTERFACE_DETAIL_DATA_A*>(detail.data()),
                    static_cast<DWORD>(detail.size()), nullptr, nullptr) != 0;
     }
 
   private:
-    const SetupApi::EntryPoints& api;
-    const HDEVINFO list;
+    const SetupApi::EntryPoints& api_;
+    const HDEVINFO list_;
 };
 
 class PathList final : public InterfaceList {
   public:
     PathList(const Protocol::Guid& interfaceClass, std::vector<std::string> paths)
-        : listed(interfaceClass, std::move(paths)) {}
+        : listed_(interfaceClass, std::move(paths)) {}
 
     bool Find(const Protocol::Guid& interfaceClass, std::uint32_t index, InterfaceRecord& record) override {
-        return listed.Find(interfaceClass, index, record);
+        return listed_.Find(interfaceClass, index, record);
     }
-    std::uint32_t DetailSize(const InterfaceRecord& record) override { return listed.DetailSize(record); }
+    std::uint32_t DetailSize(const InterfaceRecord& record) override { return listed_.DetailSize(record); }
     bool ReadDetail(const InterfaceRecord& record, std::span<std::byte> detail) override {
-        return listed.ReadDetail(record, detail);
+        return listed_.ReadDetail(record, detail);
     }
 
   private:
-    const ListedInterfaces listed;
+    const ListedInterfaces listed_;
 };
 
 }  // namespace

@@ -19,13 +19,13 @@ constexpr std::size_t LongestName = 16383;
 class RegistryKey final {
   public:
     explicit RegistryKey(const char* path) {
-        if (::RegOpenKeyExA(HKEY_LOCAL_MACHINE, path, 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS) {
-            key = nullptr;
+        if (::RegOpenKeyExA(HKEY_LOCAL_MACHINE, path, 0, KEY_QUERY_VALUE, &key_) != ERROR_SUCCESS) {
+            key_ = nullptr;
         }
     }
     ~RegistryKey() {
-        if (key != nullptr) {
-            ::RegCloseKey(key);
+        if (key_ != nullptr) {
+            ::RegCloseKey(key_);
         }
     }
     RegistryKey(const RegistryKey&) = delete;
@@ -35,8 +35,8 @@ class RegistryKey final {
     std::optional<std::string> NameOfValue(DWORD index) const {
         std::string name(LongestName + 1, '\0');
         auto length = static_cast<DWORD>(name.size());
-        if (key == nullptr || ::RegEnumValueA(key, index, name.data(), &length, nullptr, nullptr, nullptr,
-                                              nullptr) != ERROR_SUCCESS) {
+        if (key_ == nullptr || ::RegEnumValueA(key_, index, name.data(), &length, nullptr, nullptr, nullptr,
+                                               nullptr) != ERROR_SUCCESS) {
             return std::nullopt;
         }
         name.resize(length);
@@ -44,7 +44,7 @@ class RegistryKey final {
     }
 
   private:
-    HKEY key = nullptr;
+    HKEY key_ = nullptr;
 };
 
 /// Reads `digits`, two per byte, into the bytes; false unless they are exactly that many hexadecimal digits.

@@ -7,23 +7,23 @@ SetupApi::~SetupApi() {
 }
 
 const SetupApi::EntryPoints* SetupApi::Load() {
-    const std::lock_guard held(lock);
-    if (module != nullptr) {
-        return &entryPoints;
+    const std::lock_guard held(lock_);
+    if (module_ != nullptr) {
+        return &entryPoints_;
     }
-    module = ::LoadLibraryA("setupapi.dll");
-    if (module == nullptr) {
+    module_ = ::LoadLibraryA("setupapi.dll");
+    if (module_ == nullptr) {
         return nullptr;
     }
     const auto find = [this]<typename Function>(Function*& entryPoint, const char* name) {
-        entryPoint = FindEntryPoint<Function>(module, name);
+        entryPoint = FindEntryPoint<Function>(module_, name);
         return entryPoint != nullptr;
     };
-    if (find(entryPoints.getClassDevs, "SetupDiGetClassDevsA") &&
-        find(entryPoints.destroyDeviceInfoList, "SetupDiDestroyDeviceInfoList") &&
-        find(entryPoints.enumDeviceInterfaces, "SetupDiEnumDeviceInterfaces") &&
-        find(entryPoints.getDeviceInterfaceDetail, "SetupDiGetDeviceInterfaceDetailA")) {
-        return &entryPoints;
+    if (find(entryPoints_.getClassDevs, "SetupDiGetClassDevsA") &&
+        find(entryPoints_.destroyDeviceInfoList, "SetupDiDestroyDeviceInfoList") &&
+        find(entryPoints_.enumDeviceInterfaces, "SetupDiEnumDeviceInterfaces") &&
+        find(entryPoints_.getDeviceInterfaceDetail, "SetupDiGetDeviceInterfaceDetailA")) {
+        return &entryPoints_;
     }
     const DWORD code = ::GetLastError();
     Unload();
@@ -32,11 +32,11 @@ const SetupApi::EntryPoints* SetupApi::Load() {
 }
 
 void SetupApi::Unload() {
-    if (module != nullptr) {
-        ::FreeLibrary(module);
+    if (module_ != nullptr) {
+        ::FreeLibrary(module_);
     }
-    module = nullptr;
-    entryPoints = {};
+    module_ = nullptr;
+    entryPoints_ = {};
 }
 
 }  // namespace Varnholt::Platform

@@ -30,9 +30,9 @@ class SetupApi final {
   private:
     void Unload();
 
-    std::mutex lock;
-    HMODULE module = nullptr;   // guarded by lock
-    EntryPoints entryPoints{};  // written under lock, before a caller has its address
+    std::mutex lock_;
+    HMODULE module_ = nullptr;   // guarded by lock
+    EntryPoints entryPoints_{};  // written under lock, before a caller has its address
 };
 
 }  // namespace Varnholt::Platform

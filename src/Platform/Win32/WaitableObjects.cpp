@@ -107,7 +107,7 @@ struct CriticalSection::Impl {
 
 CriticalSection::CriticalSection() {
     static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
-    std::construct_at(reinterpret_cast<Impl*>(storage));
+    std::construct_at(reinterpret_cast<Impl*>(storage_));
 }
 
 CriticalSection::~CriticalSection() {
@@ -115,7 +115,7 @@ CriticalSection::~CriticalSection() {
 }
 
 CriticalSection::Impl& CriticalSection::Own() {
-    return *std::launder(reinterpret_cast<Impl*>(storage));
+    return *std::launder(reinterpret_cast<Impl*>(storage_));
 }
 
 void CriticalSection::Enter() {

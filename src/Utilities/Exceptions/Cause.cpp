@@ -6,18 +6,18 @@
 namespace Varnholt::Utilities::Exceptions {
 
 Cause::Cause(const std::exception& snapshotOf)
-    : type(&typeid(snapshotOf)), message(snapshotOf.what()), isEmpty(false) {
+    : type_(&typeid(snapshotOf)), message_(snapshotOf.what()), isEmpty_(false) {
     if (const auto* traceable = dynamic_cast<const TraceableException*>(&snapshotOf)) {
-        trace = traceable->GetTrace();
+        trace_ = traceable->GetTrace();
     }
 }
 
 void Cause::Print(std::ostream& stream) const {
-    if (isEmpty) {
+    if (isEmpty_) {
         return;
     }
-    stream << "\ncaused by: " << Tools::ReadableName(*type) << ": " << message << "\n";
-    for (const std::string& entry : trace) {
+    stream << "\ncaused by: " << Tools::ReadableName(*type_) << ": " << message_ << "\n";
+    for (const std::string& entry : trace_) {
         if (!entry.empty()) {
             stream << "\t" << entry << "\n";
         }

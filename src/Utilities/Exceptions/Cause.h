@@ -15,19 +15,19 @@ class Cause : public std::exception {
     Cause() = default;
     explicit Cause(const std::exception& snapshotOf);
 
-    const char* what() const noexcept override { return message.c_str(); }
+    const char* what() const noexcept override { return message_.c_str(); }
 
-    bool IsEmpty() const noexcept { return isEmpty; }
+    bool IsEmpty() const noexcept { return isEmpty_; }
 
     /// Writes "\ncaused by: ", the type, ": ", the message and a newline, then each trace entry on a line of
     /// its own behind a tab.
     void Print(std::ostream& stream) const;
 
   private:
-    const std::type_info* type = nullptr;
-    std::list<std::string> trace;
-    std::string message;
-    bool isEmpty = true;
+    const std::type_info* type_ = nullptr;
+    std::list<std::string> trace_;
+    std::string message_;
+    bool isEmpty_ = true;
 };
 
 }  // namespace Varnholt::Utilities::Exceptions

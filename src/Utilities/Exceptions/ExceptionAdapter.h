@@ -50,11 +50,11 @@ class ExceptionAdapter : public StdExceptionAdapter<X>, public TraceableExceptio
         try {
             std::ostringstream stream;
             Print(stream);
-            whatText = GetStdMessage();
+            whatText_ = GetStdMessage();
             if (const std::string traceText = stream.str(); !traceText.empty()) {
-                whatText += "\n" + traceText;
+                whatText_ += "\n" + traceText;
             }
-            return whatText.c_str();
+            return whatText_.c_str();
         } catch (...) {
             return GetStdMessage();  // no memory for the long text
         }
@@ -73,7 +73,7 @@ class ExceptionAdapter : public StdExceptionAdapter<X>, public TraceableExceptio
     }
 
   private:
-    mutable std::string whatText;
+    mutable std::string whatText_;
 };
 
 }  // namespace Varnholt::Utilities::Exceptions

@@ -15,19 +15,19 @@ class SourceLocation final {
                                             const char* function = __builtin_FUNCTION(),
                                             std::uint_least32_t line = __builtin_LINE()) noexcept {
         SourceLocation location;
-        location.file = file;
-        location.function = function;
-        location.lineNumber = line;
+        location.file_ = file;
+        location.function_ = function;
+        location.lineNumber_ = line;
         return location;
     }
-    constexpr const char* file_name() const noexcept { return file; }
-    constexpr const char* function_name() const noexcept { return function; }
-    constexpr std::uint_least32_t line() const noexcept { return lineNumber; }
+    constexpr const char* file_name() const noexcept { return file_; }
+    constexpr const char* function_name() const noexcept { return function_; }
+    constexpr std::uint_least32_t line() const noexcept { return lineNumber_; }
 
   private:
-    const char* file = "";
-    const char* function = "";
-    std::uint_least32_t lineNumber = 0;
+    const char* file_ = "";
+    const char* function_ = "";
+    std::uint_least32_t lineNumber_ = 0;
 };
 #endif
 

@@ -15,14 +15,14 @@ bool IsVerboseText() {
 
 void TraceableException::Print(std::ostream& stream) const {
     bool first = true;
-    for (const std::string& entry : trace) {
+    for (const std::string& entry : trace_) {
         if (!entry.empty()) {
             stream << (first ? "\t" : "\n\t") << entry;
         }
         first = false;
     }
-    if (!cause.IsEmpty()) {
-        cause.Print(stream);
+    if (!cause_.IsEmpty()) {
+        cause_.Print(stream);
     }
 }
 

@@ -21,10 +21,10 @@ class TraceableException {
     virtual ~TraceableException() = default;
     virtual const char* what() const noexcept = 0;
 
-    void AddLocation(const std::string& location) { trace.push_back(location); }
-    const std::list<std::string>& GetTrace() const noexcept { return trace; }
+    void AddLocation(const std::string& location) { trace_.push_back(location); }
+    const std::list<std::string>& GetTrace() const noexcept { return trace_; }
     /// Empty where none was recorded.
-    const Cause& GetCause() const noexcept { return cause; }
+    const Cause& GetCause() const noexcept { return cause_; }
 
     /// Writes the trace, each entry behind a tab, entries separated by newlines; empty entries write nothing.
     /// The cause follows where there is one.
@@ -32,13 +32,13 @@ class TraceableException {
 
   protected:
     explicit TraceableException(const std::string& location, const Cause& recorded = {})
-        : trace{location}, cause(recorded) {}
+        : trace_{location}, cause_(recorded) {}
     TraceableException(const TraceableException&) = default;
     TraceableException& operator=(const TraceableException&) = default;
 
   private:
-    std::list<std::string> trace;
-    Cause cause;
+    std::list<std::string> trace_;
+    Cause cause_;
 };
 
 }  // namespace Varnholt::Utilities::Exceptions

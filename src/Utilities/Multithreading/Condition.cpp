@@ -2,6 +2,6 @@
 
 namespace Varnholt::Utilities::Multithreading {
 
-Condition::Condition(Mutex& mutex) : impl(CreateConditionImpl(mutex)) {}
+Condition::Condition(Mutex& mutex) : impl_(CreateConditionImpl(mutex)) {}
 
 }  // namespace Varnholt::Utilities::Multithreading

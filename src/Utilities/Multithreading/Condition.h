@@ -28,16 +28,16 @@ class Condition final {
     explicit Condition(Mutex& mutex);
 
     /// Wakes one waiter, if there is one.
-    void signal() { impl->signal(); }
+    void signal() { impl_->signal(); }
     /// Wakes all present waiters and returns when each has left its wait for the condition. They then wait
     /// for the mutex, which the caller may hold.
-    void broadcast() { impl->broadcast(); }
+    void broadcast() { impl_->broadcast(); }
     /// The caller holds the mutex, once. Gives it up, waits without limit, takes it again, answers true. The
     /// argument has no meaning.
-    bool Wait(std::int32_t argument) { return impl->Wait(argument); }
+    bool Wait(std::int32_t argument) { return impl_->Wait(argument); }
 
   private:
-    Tools::SmartPointer<Impl> impl;
+    Tools::SmartPointer<Impl> impl_;
 };
 
 Tools::SmartPointer<Condition::Impl> CreateConditionImpl(Mutex& mutex);

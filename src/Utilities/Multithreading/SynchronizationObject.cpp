@@ -2,6 +2,6 @@
 
 namespace Varnholt::Utilities::Multithreading {
 
-SynchronizationObject::SynchronizationObject(std::unique_ptr<Impl> owned) : impl(owned.release()) {}
+SynchronizationObject::SynchronizationObject(std::unique_ptr<Impl> owned) : impl_(owned.release()) {}
 
 }  // namespace Varnholt::Utilities::Multithreading

@@ -30,14 +30,14 @@ class SynchronizationObject : public TryLockable {
 
     explicit SynchronizationObject(std::unique_ptr<Impl> owned);
 
-    void Lock() override { impl->Lock(); }
-    void Unlock() override { impl->Unlock(); }
-    bool TryLock(int timeout) override { return impl->TryLock(timeout); }
+    void Lock() override { impl_->Lock(); }
+    void Unlock() override { impl_->Unlock(); }
+    bool TryLock(int timeout) override { return impl_->TryLock(timeout); }
 
   private:
     friend class ConditionImpl;
 
-    Tools::SmartPointer<Impl> impl;
+    Tools::SmartPointer<Impl> impl_;
 };
 
 /// A recursive lock. An empty name makes it local to the process and without time-outs: its `TryLock` always

@@ -20,27 +20,27 @@ class SmartPointer final {
     explicit SmartPointer(T* object) {
         std::unique_ptr<T> guard(object);
         if (object) {
-            count = new std::uint16_t(1);
-            pointee = guard.release();
+            count_ = new std::uint16_t(1);
+            pointee_ = guard.release();
         }
     }
-    SmartPointer(const SmartPointer& other) noexcept : count(other.count), pointee(other.pointee) {
-        if (count) {
-            ++*count;
+    SmartPointer(const SmartPointer& other) noexcept : count_(other.count_), pointee_(other.pointee_) {
+        if (count_) {
+            ++*count_;
         }
     }
     SmartPointer& operator=(const SmartPointer& other) noexcept {
         if (this != &other) {
             SmartPointer copy(other);
-            std::swap(count, copy.count);
-            std::swap(pointee, copy.pointee);
+            std::swap(count_, copy.count_);
+            std::swap(pointee_, copy.pointee_);
         }
         return *this;
     }
     ~SmartPointer() {
-        if (count && --*count == 0) {
-            delete pointee;
-            delete count;
+        if (count_ && --*count_ == 0) {
+            delete pointee_;
+            delete count_;
         }
     }
 
@@ -48,29 +48,29 @@ class SmartPointer final {
     T* operator->() const;
     T& operator*() const;
 
-    bool IsEmpty() const noexcept { return pointee == nullptr; }
-    T* Get() const noexcept { return pointee; }
+    bool IsEmpty() const noexcept { return pointee_ == nullptr; }
+    T* Get() const noexcept { return pointee_; }
 
   private:
-    std::uint16_t* count = nullptr;
-    T* pointee = nullptr;
+    std::uint16_t* count_ = nullptr;
+    T* pointee_ = nullptr;
 };
 
 template <class T>
 T* SmartPointer<T>::operator->() const try {
-    if (!pointee) {
-        throw Exceptions::NullPointerException(pointee, Exceptions::Here());
+    if (!pointee_) {
+        throw Exceptions::NullPointerException(pointee_, Exceptions::Here());
     }
-    return pointee;
+    return pointee_;
 }
 TRACED
 
 template <class T>
 T& SmartPointer<T>::operator*() const try {
-    if (!pointee) {
-        throw Exceptions::NullPointerException(pointee, Exceptions::Here());
+    if (!pointee_) {
+        throw Exceptions::NullPointerException(pointee_, Exceptions::Here());
     }
-    return *pointee;
+    return *pointee_;
 }
 TRACED
 

@@ -36,50 +36,51 @@ struct Pace {
 class Round final {
   public:
     Round(unsigned seed, const Pace& pace)
-        : random(seed),
-          ending(static_cast<Ending>(seed % 4)),
-          longestPause(pace.longestPause),
-          instrument(bus.Add("port1", Endless(pace.bytesPerSecond))) {}
+        : random_(seed),
+          ending_(static_cast<Ending>(seed % 4)),
+          longestPause_(pace.longestPause),
+          instrument_(bus_.Add("port1", Endless(pace.bytesPerSecond))) {}
 
     void Play() {
         Request measure;
         const auto block = NativeBlock(static_cast<std::uint8_t>(Protocol::Request::Measure), 0);
-        files->StartControl(main, Native::ControlVendorRequest, block.data(), 10, nullptr, 0, measure.record);
+        files_->StartControl(main_, Native::ControlVendorRequest, block.data(), 10, nullptr, 0,
+                             measure.record);
         {
             Platform::TestThread other([this, pause = Pause()] { Interfere(pause); });
-            Start(reads[0]);
-            for (std::size_t turn = 0; turn < 12 && !closed; ++turn) {
-                Start(reads[(turn + 1) % 2]);
-                if (ending == Ending::Cancel && random() % 3 == 0) {
+            Start(reads_[0]);
+            for (std::size_t turn = 0; turn < 12 && !closed_; ++turn) {
+                Start(reads_[(turn + 1) % 2]);
+                if (ending_ == Ending::Cancel && random_() % 3 == 0) {
                     Platform::SleepMilliseconds(Pause());
-                    EXPECT_TRUE(files->CancelTransfers(pipe));
+                    EXPECT_TRUE(files_->CancelTransfers(pipe_));
                 }
-                Collect(reads[turn % 2]);
+                Collect(reads_[turn % 2]);
             }
-            if (ending == Ending::CloseAtOnce) {
-                EXPECT_TRUE(files->CloseFile(pipe));
-            } else if (ending == Ending::Cancel) {
-                EXPECT_TRUE(files->CancelTransfers(pipe));
+            if (ending_ == Ending::CloseAtOnce) {
+                EXPECT_TRUE(files_->CloseFile(pipe_));
+            } else if (ending_ == Ending::Cancel) {
+                EXPECT_TRUE(files_->CancelTransfers(pipe_));
             }
-            done = true;
+            done_ = true;
         }
         // Only the one that was started last can still be on its way.
-        Collect(reads[0]);
-        Collect(reads[1]);
-        if (ending == Ending::Cancel || ending == Ending::AbortFromOtherThread) {
-            EXPECT_TRUE(files->CloseFile(pipe));
+        Collect(reads_[0]);
+        Collect(reads_[1]);
+        if (ending_ == Ending::Cancel || ending_ == Ending::AbortFromOtherThread) {
+            EXPECT_TRUE(files_->CloseFile(pipe_));
         }
-        pipe = files->Open("native/port1\\PIPE01");
-        Start(reads[0]);
-        Collect(reads[0]);
-        EXPECT_EQ(collected, instrument.WithCommands([this](Simulator::Commands& commands) {
-            return commands.Answers().Expected(0, collected.size());
+        pipe_ = files_->Open("native/port1\\PIPE01");
+        Start(reads_[0]);
+        Collect(reads_[0]);
+        EXPECT_EQ(collected_, instrument_.WithCommands([this](Simulator::Commands& commands) {
+            return commands.Answers().Expected(0, collected_.size());
         })) << "lost or repeated data";
-        EXPECT_TRUE(files->CloseFile(pipe));
-        EXPECT_TRUE(files->CloseFile(main));
+        EXPECT_TRUE(files_->CloseFile(pipe_));
+        EXPECT_TRUE(files_->CloseFile(main_));
     }
     /// Reads that were ended in the middle of their data.
-    int CutOff() const { return cutOff; }
+    int CutOff() const { return cutOff_; }
 
   private:
     struct Read {
@@ -94,14 +95,14 @@ class Round final {
         settings.bytesPerSecond = bytesPerSecond;
         return settings;
     }
-    std::uint32_t Pause() { return static_cast<std::uint32_t>(random() % (longestPause + 1)); }
+    std::uint32_t Pause() { return static_cast<std::uint32_t>(random_() % (longestPause_ + 1)); }
 
     void Start(Read& read) {
         const auto length = static_cast<std::uint32_t>(read.buffer.size());
-        read.started = files->StartRead(pipe, read.buffer.data(), length, read.request.record) ||
+        read.started = files_->StartRead(pipe_, read.buffer.data(), length, read.request.record) ||
                        Platform::LastError() == Errors::IoPending;
         EXPECT_TRUE(read.started || Platform::LastError() == Errors::InvalidHandle);
-        closed = closed || !read.started;
+        closed_ = closed_ || !read.started;
     }
 
     void Collect(Read& read) {
@@ -110,46 +111,46 @@ class Round final {
         }
         read.started = false;
         std::uint32_t moved = 0;
-        const bool succeeded = files->GetResult(pipe, read.request.record, moved, true);
+        const bool succeeded = files_->GetResult(pipe_, read.request.record, moved, true);
         EXPECT_TRUE(succeeded || Platform::LastError() == Errors::OperationAborted) << Platform::LastError();
         EXPECT_TRUE(read.request.TakeSignal()) << "not signalled";
         EXPECT_FALSE(read.request.TakeSignal()) << "signalled twice";
-        collected.insert(collected.end(), read.buffer.begin(),
-                         read.buffer.begin() + static_cast<std::ptrdiff_t>(moved));
-        cutOff += moved > 0 && moved < read.buffer.size() ? 1 : 0;
+        collected_.insert(collected_.end(), read.buffer.begin(),
+                          read.buffer.begin() + static_cast<std::ptrdiff_t>(moved));
+        cutOff_ += moved > 0 && moved < read.buffer.size() ? 1 : 0;
     }
 
     void Interfere(std::uint32_t pause) {
-        if (ending == Ending::Cancel || ending == Ending::CloseAtOnce) {
+        if (ending_ == Ending::Cancel || ending_ == Ending::CloseAtOnce) {
             return;
         }
         Platform::SleepMilliseconds(pause);
-        if (ending == Ending::CloseFromOtherThread) {
-            EXPECT_TRUE(files->CloseFile(pipe));
+        if (ending_ == Ending::CloseFromOtherThread) {
+            EXPECT_TRUE(files_->CloseFile(pipe_));
             return;
         }
         const auto block = NativeBlock(0, 0, Protocol::BulkInEndpoint);
-        while (!done) {
+        while (!done_) {
             Request abort;
-            EXPECT_TRUE(files->StartControl(main, Native::ControlAbortPipe, block.data(), 10, nullptr, 0,
-                                            abort.record));
+            EXPECT_TRUE(files_->StartControl(main_, Native::ControlAbortPipe, block.data(), 10, nullptr, 0,
+                                             abort.record));
             Platform::SleepMilliseconds(pause);
         }
     }
 
-    std::minstd_rand random;
-    const Ending ending;
-    const std::uint32_t longestPause;
-    Simulator::SimulatedBus bus{Platform::ClockScheduler()};
-    Simulator::SimulatedInstrument& instrument;
-    const std::unique_ptr<Platform::DeviceFileSystem> files = Platform::Drivers::MakeDriverFileSystem(bus);
-    const Platform::Handle main = files->Open("native/port1");
-    Platform::Handle pipe = files->Open("native/port1\\PIPE01");
-    std::array<Read, 2> reads;
-    Bytes collected;
-    int cutOff = 0;
-    bool closed = false;
-    std::atomic<bool> done{false};
+    std::minstd_rand random_;
+    const Ending ending_;
+    const std::uint32_t longestPause_;
+    Simulator::SimulatedBus bus_{Platform::ClockScheduler()};
+    Simulator::SimulatedInstrument& instrument_;
+    const std::unique_ptr<Platform::DeviceFileSystem> files_ = Platform::Drivers::MakeDriverFileSystem(bus_);
+    const Platform::Handle main_ = files_->Open("native/port1");
+    Platform::Handle pipe_ = files_->Open("native/port1\\PIPE01");
+    std::array<Read, 2> reads_;
+    Bytes collected_;
+    int cutOff_ = 0;
+    bool closed_ = false;
+    std::atomic<bool> done_{false};
 };
 
 TEST(Cancellation, LosesAndRepeatsNothingWhereThreadsRace) {

@@ -78,20 +78,20 @@ inline Bytes RequestBlock(std::uint8_t request, std::uint16_t value = 0, std::ui
 /// Both drivers over one scripted device, "port1".
 class DriverFixture : public testing::Test {
   protected:
-    DriverFixture() { bus.Plug("port1", device); }
+    DriverFixture() { bus_.Plug("port1", device_); }
 
     Platform::Handle Open(const std::string& path) {
-        const Platform::Handle handle = files->Open(path);
+        const Platform::Handle handle = files_->Open(path);
         EXPECT_NE(handle, Platform::InvalidHandle()) << path << ": error " << Platform::LastError();
         return handle;
     }
     Platform::ErrorCode OpenError(const std::string& path) {
         Platform::SetLastError(0xDEAD);
-        const Platform::Handle handle = files->Open(path);
+        const Platform::Handle handle = files_->Open(path);
         if (handle == Platform::InvalidHandle()) {
             return Platform::LastError();
         }
-        files->CloseFile(handle);
+        files_->CloseFile(handle);
         return Platform::Errors::Success;
     }
     Platform::Handle OpenPipe(std::uint32_t number) {
@@ -115,8 +115,8 @@ class DriverFixture : public testing::Test {
         Request request;
         return Complete(
             file, request,
-            files->StartControl(file, code, input.data(), static_cast<std::uint32_t>(input.size()),
-                                output.data(), static_cast<std::uint32_t>(output.size()), request.record));
+            files_->StartControl(file, code, input.data(), static_cast<std::uint32_t>(input.size()),
+                                 output.data(), static_cast<std::uint32_t>(output.size()), request.record));
     }
     Outcome Read(Platform::Handle file, Bytes& buffer) {
         Request request;
@@ -126,11 +126,11 @@ class DriverFixture : public testing::Test {
         Request request;
         return Complete(
             file, request,
-            files->StartWrite(file, data.data(), static_cast<std::uint32_t>(data.size()), request.record));
+            files_->StartWrite(file, data.data(), static_cast<std::uint32_t>(data.size()), request.record));
     }
     bool StartRead(Platform::Handle file, Bytes& buffer, Request& request) {
-        return files->StartRead(file, buffer.data(), static_cast<std::uint32_t>(buffer.size()),
-                                request.record);
+        return files_->StartRead(file, buffer.data(), static_cast<std::uint32_t>(buffer.size()),
+                                 request.record);
     }
     /// Starts a read that must stay pending.
     void StartPending(Platform::Handle file, Bytes& buffer, Request& request) {
@@ -139,13 +139,13 @@ class DriverFixture : public testing::Test {
     }
     Outcome Result(Platform::Handle file, Request& request, bool wait = false) {
         std::uint32_t bytes = 0xDEAD;
-        const bool succeeded = files->GetResult(file, request.record, bytes, wait);
+        const bool succeeded = files_->GetResult(file, request.record, bytes, wait);
         return {succeeded ? Platform::Errors::Success : Platform::LastError(), bytes};
     }
 
-    ScriptedBus bus;
-    std::shared_ptr<ScriptedUsbDevice> device = std::make_shared<ScriptedUsbDevice>();
-    std::unique_ptr<Platform::DeviceFileSystem> files = Platform::Drivers::MakeDriverFileSystem(bus);
+    ScriptedBus bus_;
+    std::shared_ptr<ScriptedUsbDevice> device_ = std::make_shared<ScriptedUsbDevice>();
+    std::unique_ptr<Platform::DeviceFileSystem> files_ = Platform::Drivers::MakeDriverFileSystem(bus_);
 
   private:
     Outcome Complete(Platform::Handle file, Request& request, bool atOnce) {

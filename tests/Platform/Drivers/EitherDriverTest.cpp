@@ -49,7 +49,7 @@ INSTANTIATE_TEST_SUITE_P(, EitherDriver, testing::Values(Kind::Native, Kind::Usb
                          });
 
 TEST_P(EitherDriver, CarriesVendorRequests) {
-    device->Expect({
+    device_->Expect({
         VendorOut(0xC0, {}),
         VendorOut(0xC1, Counting(8), 0x1234, 0xABCD),
         VendorOut(0xA0, Counting(65535), 0x2000),
@@ -68,7 +68,7 @@ TEST_P(EitherDriver, CarriesVendorRequests) {
 }
 
 TEST_P(EitherDriver, HasAFileForEachEndpoint) {
-    device->Expect({
+    device_->Expect({
         BulkIn(65536, Counting(65536)),
         BulkOut(Counting(256, 7)),
         BulkOut({0}),
@@ -98,8 +98,8 @@ TEST_P(EitherDriver, HasAFileForEachEndpoint) {
 }
 
 TEST_P(EitherDriver, AbortEndsTheTransfersOfTheEndpoint) {
-    device->LeaveToTest(BulkInEndpoint);
-    device->LeaveToTest(InterruptInEndpoint);
+    device_->LeaveToTest(BulkInEndpoint);
+    device_->LeaveToTest(InterruptInEndpoint);
     const auto main = OpenMain();
     const auto in = OpenEndpoint(BulkInEndpoint);
     const auto interrupt = OpenEndpoint(InterruptInEndpoint);
@@ -115,17 +115,17 @@ TEST_P(EitherDriver, AbortEndsTheTransfersOfTheEndpoint) {
     EXPECT_EQ(Result(in, aborted[0], true), (Outcome{CodeOfAbort(), 0}));
     EXPECT_EQ(Result(in, aborted[1], true), (Outcome{CodeOfAbort(), 0}));
     EXPECT_EQ(Result(interrupt, other), (Outcome{Errors::IoIncomplete, 0}));
-    device->Send(InterruptInEndpoint, {1});
+    device_->Send(InterruptInEndpoint, {1});
     EXPECT_EQ(Result(interrupt, other, true), (Outcome{0, 1}));
 }
 
 TEST_P(EitherDriver, AnInterruptionEndsAllTransfersAndLetsNoneStart) {
-    device->LeaveToTest(BulkInEndpoint);
-    device->LeaveToTest(InterruptInEndpoint);
-    const auto drivers = std::move(files);
+    device_->LeaveToTest(BulkInEndpoint);
+    device_->LeaveToTest(InterruptInEndpoint);
+    const auto drivers = std::move(files_);
     auto interruptible = std::make_unique<Platform::InterruptibleDeviceFiles>(*drivers);
     auto& inFront = *interruptible;
-    files = std::move(interruptible);
+    files_ = std::move(interruptible);
     const Handle opened[] = {OpenMain(), OpenEndpoint(BulkInEndpoint), OpenEndpoint(InterruptInEndpoint)};
     Bytes buffers[3] = {Bytes(8), Bytes(8), Bytes(8)};
     Request requests[3];
@@ -141,16 +141,16 @@ TEST_P(EitherDriver, AnInterruptionEndsAllTransfersAndLetsNoneStart) {
     EXPECT_FALSE(StartRead(opened[1], buffers[0], refused));
     EXPECT_EQ(Platform::LastError(), Errors::OperationAborted);
     EXPECT_TRUE(refused.TakeSignal()) << "nobody must wait for what is refused";
-    EXPECT_FALSE(files->StartControl(opened[0], 0, nullptr, 0, nullptr, 0, refused.record));
+    EXPECT_FALSE(files_->StartControl(opened[0], 0, nullptr, 0, nullptr, 0, refused.record));
     EXPECT_EQ(Platform::LastError(), Errors::OperationAborted);
     inFront.Resume();
     StartPending(opened[1], buffers[0], requests[0]);
-    device->Send(BulkInEndpoint, {1, 2});
+    device_->Send(BulkInEndpoint, {1, 2});
     EXPECT_EQ(Result(opened[1], requests[0]), (Outcome{0, 2}));
     for (const Handle file : opened) {
-        EXPECT_TRUE(files->CloseFile(file));
+        EXPECT_TRUE(files_->CloseFile(file));
     }
-    files.reset();
+    files_.reset();
 }
 
 TEST_P(EitherDriver, HasACodeForEveryOutcome) {
@@ -171,16 +171,16 @@ TEST_P(EitherDriver, HasACodeForEveryOutcome) {
         SCOPED_TRACE(static_cast<int>(row.status));
         const ErrorCode code = Code(row.native, row.usbIo);
         Bytes buffer(16), data{1, 2};
-        device->Expect({VendorOut(0xC0, {1, 2}).Ends(row.status, 1)});
+        device_->Expect({VendorOut(0xC0, {1, 2}).Ends(row.status, 1)});
         EXPECT_EQ(Vendor(main, 0xC0, false, data), (Outcome{code, 1}));
         if (row.status == TransferStatus::DeviceGone) {
             break;  // nothing is asked of it any more
         }
-        device->Expect({BulkIn(16, Counting(16)).Ends(row.status, 5)});
+        device_->Expect({BulkIn(16, Counting(16)).Ends(row.status, 5)});
         EXPECT_EQ(Read(in, buffer), (Outcome{code, 5}));
         EXPECT_EQ(buffer[4], 4) << "what has moved counts, whatever the end";
         if (row.status == TransferStatus::Stalled) {
-            device->Expect({HaltCleared(BulkInEndpoint), BulkIn(16, Counting(16))});
+            device_->Expect({HaltCleared(BulkInEndpoint), BulkIn(16, Counting(16))});
             EXPECT_EQ(Read(in, buffer), (Outcome{0, 16})) << "the halt is cleared";
         }
     }

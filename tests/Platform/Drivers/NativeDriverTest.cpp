@@ -35,42 +35,42 @@ TEST_F(NativeDriver, OpensWhatItsPathsName) {
     for (const auto& row : cases) {
         EXPECT_EQ(OpenError(row.path), row.error) << row.path;
     }
-    EXPECT_FALSE(device->IsOpen());
+    EXPECT_FALSE(device_->IsOpen());
 }
 
 TEST_F(NativeDriver, ListsTheBus) {
-    bus.Plug("port0", std::make_shared<ScriptedUsbDevice>());
-    EXPECT_EQ(files->ListInterfaces(Native::InterfaceClass),
+    bus_.Plug("port0", std::make_shared<ScriptedUsbDevice>());
+    EXPECT_EQ(files_->ListInterfaces(Native::InterfaceClass),
               (std::vector<std::string>{"native/port1", "native/port0"}));
-    EXPECT_EQ(files->ListInterfaces(Protocol::UsbIoDriver::InterfaceClass),
+    EXPECT_EQ(files_->ListInterfaces(Protocol::UsbIoDriver::InterfaceClass),
               (std::vector<std::string>{"usbio/port1", "usbio/port0"}));
-    EXPECT_TRUE(files->ListInterfaces(Protocol::Guid{}).empty());
+    EXPECT_TRUE(files_->ListInterfaces(Protocol::Guid{}).empty());
 }
 
 TEST_F(NativeDriver, FilesShareOneClaimedDevice) {
     const auto main = Open("native/port1");
     const auto pipe = OpenPipe(1);
-    EXPECT_EQ(device->TimesOpened(), 1u);
-    EXPECT_EQ(device->TimesClaimed(), 1u);
-    EXPECT_TRUE(files->CloseFile(main));
-    EXPECT_TRUE(device->IsClaimed());
-    EXPECT_TRUE(files->CloseFile(pipe));
-    EXPECT_FALSE(device->IsClaimed());
-    EXPECT_FALSE(device->IsOpen());
+    EXPECT_EQ(device_->TimesOpened(), 1u);
+    EXPECT_EQ(device_->TimesClaimed(), 1u);
+    EXPECT_TRUE(files_->CloseFile(main));
+    EXPECT_TRUE(device_->IsClaimed());
+    EXPECT_TRUE(files_->CloseFile(pipe));
+    EXPECT_FALSE(device_->IsClaimed());
+    EXPECT_FALSE(device_->IsOpen());
 }
 
 TEST_F(NativeDriver, OpenPassesOnWhyTheDeviceCannotBeHad) {
     for (const auto code : {Errors::Busy, Errors::AccessDenied, Errors::DeviceNotConnected}) {
-        device->AnswerClaim(code);
+        device_->AnswerClaim(code);
         EXPECT_EQ(OpenError("native/port1"), code);
-        EXPECT_FALSE(device->IsOpen());
-        device->AnswerClaim(Errors::Success);
-        bus.AnswerOpen(code);
+        EXPECT_FALSE(device_->IsOpen());
+        device_->AnswerClaim(Errors::Success);
+        bus_.AnswerOpen(code);
         EXPECT_EQ(OpenError("native/port1"), code);
-        bus.AnswerOpen(Errors::Success);
-        device->AnswerEndpoints(code);
+        bus_.AnswerOpen(Errors::Success);
+        device_->AnswerEndpoints(code);
         EXPECT_EQ(OpenError("native/port1\\PIPE01"), code);
-        device->AnswerEndpoints(Errors::Success);
+        device_->AnswerEndpoints(Errors::Success);
     }
     EXPECT_EQ(OpenError("native/port1"), Errors::Success);
 }
@@ -120,7 +120,7 @@ TEST_F(NativeDriver, RefusesWhatAFileDoesNotTake) {
 }
 
 TEST_F(NativeDriver, ButtonReportHasNoDataStage) {
-    device->Expect({VendorOut(0xD0, {}, 3)});
+    device_->Expect({VendorOut(0xD0, {}, 3)});
     const auto main = Open("native/port1");
     Bytes undefined(8, 0x77);
     EXPECT_EQ(Control(main, Native::ControlButtonReport, NativeBlock(0xD0, 0, 3), undefined),
@@ -128,7 +128,7 @@ TEST_F(NativeDriver, ButtonReportHasNoDataStage) {
 }
 
 TEST_F(NativeDriver, ClearsAHaltBeforeTheNextTransferOrTheEnd) {
-    device->Expect({
+    device_->Expect({
         BulkOut({1}),
         BulkIn(8, {}).Ends(TransferStatus::Stalled),
         BulkOut({2}),
@@ -156,7 +156,7 @@ TEST_F(NativeDriver, ClearsAHaltBeforeTheNextTransferOrTheEnd) {
     EXPECT_EQ(Read(readPipe, buffer), (Outcome{0, 8}));
     EXPECT_EQ(Read(readPipe, buffer), (Outcome{Errors::GeneralFailure, 0}));
     for (const Platform::Handle file : {main, readPipe, writePipe}) {
-        EXPECT_TRUE(files->CloseFile(file));
+        EXPECT_TRUE(files_->CloseFile(file));
     }
 }
 

@@ -34,9 +34,9 @@ class UsbIoDriver : public DriverFixture {
                 << name << ", step " << i << ": code 0x" << std::hex << step.code << " on file " << step.file;
         }
         for (const auto handle : opened) {
-            EXPECT_TRUE(files->CloseFile(handle));
+            EXPECT_TRUE(files_->CloseFile(handle));
         }
-        EXPECT_FALSE(device->IsOpen()) << name;
+        EXPECT_FALSE(device_->IsOpen()) << name;
     }
 };
 
@@ -87,7 +87,7 @@ TEST_F(UsbIoDriver, ChecksSizesAndContents) {
           {0, Code::SetConfiguration, ConfigurationBlock(0, 1, 0, 0, 0), 0, Status::InvalidParameter},
           {0, Code::SetConfiguration, ConfigurationBlock(0, 1, 1), 0, Status::InterfaceNotFound},
           {0, Code::SetConfiguration, ConfigurationBlock(0, 1, 0, 1), 0, Status::InterfaceNotFound}});
-    EXPECT_EQ(device->TimesOpened(), 0u) << "a block that is refused does not reach the device";
+    EXPECT_EQ(device_->TimesOpened(), 0u) << "a block that is refused does not reach the device";
     Play("the other controls",
          {{0, Code::SetConfiguration, ConfigurationBlock(), 0, 0},
           {0, Code::BindPipe, {}, 0, Status::InputBufferTooSmall},
@@ -107,13 +107,13 @@ TEST_F(UsbIoDriver, ChecksSizesAndContents) {
 }
 
 TEST_F(UsbIoDriver, ListingLeavesTheDeviceAlone) {
-    device->AnswerClaim(Errors::Busy);
+    device_->AnswerClaim(Errors::Busy);
     const auto file = Open("usbio/port1");
     Bytes info(16, 0x55);
     EXPECT_EQ(Control(file, Code::GetDriverInfo, {}, info), (Outcome{0, 12}));
     EXPECT_EQ(info, (Bytes{0x30, 0x02, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0x55, 0x55, 0x55, 0x55}));
-    EXPECT_TRUE(files->CloseFile(file));
-    EXPECT_EQ(device->TimesOpened(), 0u);
+    EXPECT_TRUE(files_->CloseFile(file));
+    EXPECT_EQ(device_->TimesOpened(), 0u);
 }
 
 TEST_F(UsbIoDriver, ConfiguringTellsWhyTheDeviceCannotBeHad) {
@@ -127,25 +127,25 @@ TEST_F(UsbIoDriver, ConfiguringTellsWhyTheDeviceCannotBeHad) {
     };
     for (const auto& row : cases) {
         const auto file = Open("usbio/port1");
-        bus.AnswerOpen(row.code);
+        bus_.AnswerOpen(row.code);
         EXPECT_EQ(Control(file, Code::SetConfiguration, ConfigurationBlock()).code, row.status) << row.code;
-        EXPECT_TRUE(files->CloseFile(file));
-        bus.AnswerOpen(Errors::Success);
+        EXPECT_TRUE(files_->CloseFile(file));
+        bus_.AnswerOpen(Errors::Success);
 
         const auto silent = Open("usbio/port1");
         EXPECT_EQ(Control(silent, Code::SetConfiguration, ConfigurationBlock()).code, Status::Success);
-        device->AnswerEndpoints(row.code);
+        device_->AnswerEndpoints(row.code);
         EXPECT_EQ(Control(silent, Code::BindPipe, {In}).code, row.status) << row.code;
-        device->AnswerEndpoints(Errors::Success);
-        EXPECT_TRUE(files->CloseFile(silent));
+        device_->AnswerEndpoints(Errors::Success);
+        EXPECT_TRUE(files_->CloseFile(silent));
 
         const auto second = Open("usbio/port1");
-        device->AnswerClaim(row.code);
+        device_->AnswerClaim(row.code);
         EXPECT_EQ(Control(second, Code::SetConfiguration, ConfigurationBlock()).code, row.status) << row.code;
-        device->AnswerClaim(Errors::Success);
+        device_->AnswerClaim(Errors::Success);
         EXPECT_EQ(Control(second, Code::UnconfigureDevice).code,
                   row.status == Status::DeviceRemoved ? Status::DeviceRemoved : Status::Success);
-        EXPECT_TRUE(files->CloseFile(second));
+        EXPECT_TRUE(files_->CloseFile(second));
     }
 }
 
@@ -154,17 +154,17 @@ TEST_F(UsbIoDriver, TheConfigurationLastsAsLongAsAFileIsOpen) {
     const auto second = Open("usbio/port1");
     EXPECT_EQ(Control(first, Code::SetConfiguration, ConfigurationBlock()).code, 0u);
     EXPECT_EQ(Control(first, Code::BindPipe, {In}).code, 0u);
-    EXPECT_TRUE(files->CloseFile(first));
-    EXPECT_TRUE(device->IsClaimed());
+    EXPECT_TRUE(files_->CloseFile(first));
+    EXPECT_TRUE(device_->IsClaimed());
     EXPECT_EQ(Control(second, Code::BindPipe, {In}).code, 0u) << "closing unbinds";
-    EXPECT_TRUE(files->CloseFile(second));
-    EXPECT_FALSE(device->IsClaimed());
+    EXPECT_TRUE(files_->CloseFile(second));
+    EXPECT_FALSE(device_->IsClaimed());
 
     const auto third = Open("usbio/port1");
     EXPECT_EQ(Control(third, Code::BindPipe, {In}).code, Status::NotConfigured);
     EXPECT_EQ(Control(third, Code::SetConfiguration, ConfigurationBlock()).code, 0u);
     EXPECT_EQ(Control(third, Code::UnconfigureDevice).code, 0u);
-    EXPECT_FALSE(device->IsClaimed());
+    EXPECT_FALSE(device_->IsClaimed());
 }
 
 TEST_F(UsbIoDriver, ParametersBelongToTheDevice) {
@@ -190,7 +190,7 @@ TEST_F(UsbIoDriver, TransfersNeedABoundPipe) {
 TEST_F(UsbIoDriver, PassesOnReservedBitsOfTheRequestType) {
     Exchange reserved = VendorOut(0xC7, {5});
     reserved.setup.requestType |= 0x1C;
-    device->Expect({reserved});
+    device_->Expect({reserved});
     Bytes data{5};
     EXPECT_EQ(
         Control(OpenBound(In), Code::ClassOrVendorOutRequest, RequestBlock(0xC7, 0, 0, 2, 0, 0x1C), data),
@@ -198,7 +198,7 @@ TEST_F(UsbIoDriver, PassesOnReservedBitsOfTheRequestType) {
 }
 
 TEST_F(UsbIoDriver, TheConfigurationLimitsTransfers) {
-    device->Expect({BulkIn(512, {})});
+    device_->Expect({BulkIn(512, {})});
     const auto file = Open("usbio/port1");
     EXPECT_EQ(Control(file, Code::SetConfiguration, ConfigurationBlock(0, 1, 0, 0, 512)).code, 0u);
     EXPECT_EQ(Control(file, Code::BindPipe, {In}).code, 0u);
@@ -212,9 +212,9 @@ TEST_F(UsbIoDriver, GivesUpWhatNobodyElseLimits) {
     if (!clock.IsVirtual()) {
         GTEST_SKIP() << "takes eleven seconds of real time";
     }
-    device->Expect({VendorOut(0xC0, {}).OnDemand(), VendorIn(0xC2, 8, Counting(8)).After(4'999'000),
-                    BulkOut(Counting(100)).OnDemand().MovesWhenCancelled(64), BulkOut({1}).After(5'000'000),
-                    BulkIn(8, {}).OnDemand()});
+    device_->Expect({VendorOut(0xC0, {}).OnDemand(), VendorIn(0xC2, 8, Counting(8)).After(4'999'000),
+                     BulkOut(Counting(100)).OnDemand().MovesWhenCancelled(64), BulkOut({1}).After(5'000'000),
+                     BulkIn(8, {}).OnDemand()});
     const auto out = OpenBound(Out);
     const auto in = OpenBound(In);
     Bytes buffer(8);
@@ -232,17 +232,17 @@ TEST_F(UsbIoDriver, GivesUpWhatNobodyElseLimits) {
     StartPending(in, buffer, reading);
     EXPECT_EQ(Platform::Wait(reading.event.Get(), 100'000), Platform::WaitResult::TimedOut)
         << "who reads has a limit of his own";
-    EXPECT_TRUE(files->CloseFile(in));
+    EXPECT_TRUE(files_->CloseFile(in));
 }
 
 TEST_F(UsbIoDriver, ADeviceThatIsGoneHasOneCode) {
-    device->LeaveToTest(In);
+    device_->LeaveToTest(In);
     const auto main = Open("usbio/port1");
     const auto in = OpenBound(In);
     Bytes buffer(8), info(12), parameters(8);
     Request reading;
     StartPending(in, buffer, reading);
-    bus.Unplug("port1");
+    bus_.Unplug("port1");
     EXPECT_EQ(Result(in, reading, true), (Outcome{Status::DeviceRemoved, 0}));
     EXPECT_EQ(Read(in, buffer).code, Status::DeviceRemoved);
     EXPECT_EQ(Control(main, Code::ClassOrVendorOutRequest, RequestBlock(0xC0)).code, Status::DeviceRemoved);
@@ -253,8 +253,8 @@ TEST_F(UsbIoDriver, ADeviceThatIsGoneHasOneCode) {
     EXPECT_EQ(Control(main, Code::GetDeviceParameters, {}, parameters).code, Status::DeviceRemoved);
     EXPECT_EQ(Control(main, Code::GetDriverInfo, {}, info).code, 0u);
     EXPECT_EQ(OpenError("usbio/port1"), Errors::FileNotFound);
-    EXPECT_TRUE(files->CloseFile(in));
-    EXPECT_TRUE(files->CloseFile(main));
+    EXPECT_TRUE(files_->CloseFile(in));
+    EXPECT_TRUE(files_->CloseFile(main));
 }
 
 }  // namespace

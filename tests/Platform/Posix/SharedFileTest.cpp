@@ -28,10 +28,10 @@ std::string PathOf(const std::string& name) {
 /// A name whose file the test may tamper with.
 class SharedFiles : public testing::Test {
   protected:
-    void TearDown() override { std::filesystem::remove(path); }
+    void TearDown() override { std::filesystem::remove(path_); }
 
-    const std::string name = UniqueName("tampered");
-    const std::string path = PathOf(name);
+    const std::string name_ = UniqueName("tampered");
+    const std::string path_ = PathOf(name_);
 };
 
 bool CanBeUsed(const OwnedHandle& mutex) {
@@ -39,16 +39,16 @@ bool CanBeUsed(const OwnedHandle& mutex) {
 }
 
 TEST_F(SharedFiles, AreTheUsersOwnAndGoWithTheLastHandle) {
-    OwnedHandle first(MakeMutex(name));
-    OwnedHandle second(MakeMutex(name));
+    OwnedHandle first(MakeMutex(name_));
+    OwnedHandle second(MakeMutex(name_));
     struct stat state {};
-    ASSERT_EQ(stat(path.c_str(), &state), 0);
+    ASSERT_EQ(stat(path_.c_str(), &state), 0);
     EXPECT_EQ(state.st_mode & 0777, 0600u);
     EXPECT_EQ(state.st_uid, geteuid());
     first.Reset();
-    EXPECT_TRUE(std::filesystem::exists(path));
+    EXPECT_TRUE(std::filesystem::exists(path_));
     second.Reset();
-    EXPECT_FALSE(std::filesystem::exists(path));
+    EXPECT_FALSE(std::filesystem::exists(path_));
 }
 
 TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
@@ -70,15 +70,15 @@ TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
     };
     for (const auto& content : cases) {
         SCOPED_TRACE(content.text);
-        content.make(path);
-        const int user = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+        content.make(path_);
+        const int user = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
         ASSERT_EQ(flock(user, LOCK_SH), 0);
         SetLastError(Errors::Success);
-        EXPECT_EQ(MakeMutex(name), NoHandle);
+        EXPECT_EQ(MakeMutex(name_), NoHandle);
         EXPECT_EQ(LastError(), Errors::InvalidData);
         close(user);
-        EXPECT_TRUE(CanBeUsed(OwnedHandle(MakeMutex(name))));
-        EXPECT_FALSE(std::filesystem::exists(path));
+        EXPECT_TRUE(CanBeUsed(OwnedHandle(MakeMutex(name_))));
+        EXPECT_FALSE(std::filesystem::exists(path_));
     }
 }
 
@@ -98,14 +98,14 @@ TEST_F(SharedFiles, ThatAreNoFilesOfOursAreRefused) {
     };
     for (const auto& found : cases) {
         SCOPED_TRACE(found.text);
-        if (!found.make(path)) {
+        if (!found.make(path_)) {
             EXPECT_NE(geteuid(), 0u);  // only root can give a file away
             continue;
         }
         SetLastError(Errors::Success);
-        EXPECT_EQ(MakeMutex(name), NoHandle);
+        EXPECT_EQ(MakeMutex(name_), NoHandle);
         EXPECT_EQ(LastError(), Errors::AccessDenied);
-        std::filesystem::remove(path);
+        std::filesystem::remove(path_);
     }
 }
 
@@ -113,26 +113,26 @@ TEST_F(SharedFiles, ThatAreNoFilesOfOursAreRefused) {
 TEST_F(SharedFiles, OfTheDeadAreTakenOver) {
     const pid_t child = fork();
     if (child == 0) {
-        const Handle mutex = MakeMutex(name);
+        const Handle mutex = MakeMutex(name_);
         Wait(mutex, 0);
         std::_Exit(0);
     }
     int status = 0;
     ASSERT_EQ(waitpid(child, &status, 0), child);
-    ASSERT_TRUE(std::filesystem::exists(path));
-    OwnedHandle mutex(MakeMutex(name));
+    ASSERT_TRUE(std::filesystem::exists(path_));
+    OwnedHandle mutex(MakeMutex(name_));
     EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Abandoned);
     EXPECT_TRUE(ReleaseMutex(mutex.Get()));
     mutex.Reset();
-    EXPECT_FALSE(std::filesystem::exists(path));
+    EXPECT_FALSE(std::filesystem::exists(path_));
 }
 
 /// Somebody who keeps the file locked for himself makes it unusable, but holds nobody up for good.
 TEST_F(SharedFiles, ThatAreLockedAreBusy) {
-    std::ofstream{path};
-    const int user = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    std::ofstream{path_};
+    const int user = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
     ASSERT_EQ(flock(user, LOCK_EX), 0);
-    EXPECT_EQ(MakeMutex(name), NoHandle);
+    EXPECT_EQ(MakeMutex(name_), NoHandle);
     EXPECT_EQ(LastError(), Errors::Busy);
     close(user);
 }

@@ -18,11 +18,11 @@ using Posix::UserDirectory;
 /// Stands for the machine's shared memory.
 class UserDirectories : public testing::Test {
   protected:
-    void SetUp() override { std::filesystem::create_directory(above); }
-    void TearDown() override { std::filesystem::remove_all(above); }
+    void SetUp() override { std::filesystem::create_directory(above_); }
+    void TearDown() override { std::filesystem::remove_all(above_); }
 
-    const std::string above = testing::TempDir() + UniqueName("shared-memory");
-    const std::string first = above + "/ostra-" + std::to_string(geteuid());
+    const std::string above_ = testing::TempDir() + UniqueName("shared-memory");
+    const std::string first_ = above_ + "/ostra-" + std::to_string(geteuid());
 };
 
 TEST_F(UserDirectories, AreFoundBesideWhatOthersPutInTheirPlace) {
@@ -41,7 +41,7 @@ TEST_F(UserDirectories, AreFoundBesideWhatOthersPutInTheirPlace) {
              return mkdir(name.c_str(), 0777) == 0 && chown(name.c_str(), 1, 1) == 0;
          }},
     };
-    std::string expected = first;
+    std::string expected = first_;
     int taken = 0;
     for (const auto& squatter : squatters) {
         SCOPED_TRACE(squatter.text);
@@ -49,10 +49,10 @@ TEST_F(UserDirectories, AreFoundBesideWhatOthersPutInTheirPlace) {
             EXPECT_NE(geteuid(), 0u);  // only root can give a directory away
             break;
         }
-        expected = first + "." + std::to_string(++taken);
+        expected = first_ + "." + std::to_string(++taken);
         struct stat state {};
         for (int time = 0; time < 2; ++time) {  // makes it, and finds it
-            const auto directory = UserDirectory::Open(above);
+            const auto directory = UserDirectory::Open(above_);
             ASSERT_TRUE(directory);
             EXPECT_EQ(directory->Path(), expected);
             ASSERT_EQ(fstat(directory->Descriptor(), &state), 0);
@@ -64,10 +64,10 @@ TEST_F(UserDirectories, AreFoundBesideWhatOthersPutInTheirPlace) {
 }
 
 TEST_F(UserDirectories, SayWhyTheyCannotBeHad) {
-    std::ofstream{above + "/file"};
-    EXPECT_FALSE(UserDirectory::Open(above + "/nothing"));
+    std::ofstream{above_ + "/file"};
+    EXPECT_FALSE(UserDirectory::Open(above_ + "/nothing"));
     EXPECT_EQ(LastError(), Errors::FileNotFound);
-    EXPECT_FALSE(UserDirectory::Open(above + "/file"));
+    EXPECT_FALSE(UserDirectory::Open(above_ + "/file"));
     EXPECT_EQ(LastError(), Errors::PathNotFound);
 }
 

@@ -20,32 +20,32 @@ class LibUsbEventsTest : public testing::Test {
   protected:
     void SetUp() override {
         libusb_set_option(nullptr, LIBUSB_OPTION_NO_DEVICE_DISCOVERY);
-        ASSERT_EQ(libusb_init(&context), LIBUSB_SUCCESS);
-        events = std::make_shared<LibUsbEvents>(context);
+        ASSERT_EQ(libusb_init(&context_), LIBUSB_SUCCESS);
+        events_ = std::make_shared<LibUsbEvents>(context_);
     }
     void TearDown() override {
         Posix::WorkOffInWaits({});
-        events.reset();
-        libusb_exit(context);
+        events_.reset();
+        libusb_exit(context_);
     }
 
     static std::uint32_t Echo(void* test) {
         auto& self = *static_cast<LibUsbEventsTest*>(test);
-        Posix::WorkOffInWaits(self.events);
+        Posix::WorkOffInWaits(self.events_);
         for (int i = 0; i < Rounds; ++i) {
-            if (Wait(self.there.Get(), LongTimeout) != WaitResult::Signalled) {
+            if (Wait(self.there_.Get(), LongTimeout) != WaitResult::Signalled) {
                 return 1;
             }
-            SignalEvent(self.back.Get());
+            SignalEvent(self.back_.Get());
         }
         return 0;
     }
 
     static constexpr int Rounds = 2000;
-    libusb_context* context = nullptr;
-    std::shared_ptr<LibUsbEvents> events;
-    const OwnedHandle there{MakeAutoResetEvent()};
-    const OwnedHandle back{MakeAutoResetEvent()};
+    libusb_context* context_ = nullptr;
+    std::shared_ptr<LibUsbEvents> events_;
+    const OwnedHandle there_{MakeAutoResetEvent()};
+    const OwnedHandle back_{MakeAutoResetEvent()};
 };
 
 TEST_F(LibUsbEventsTest, ItsThreadTakesNoSignalOfTheHost) {
@@ -55,39 +55,39 @@ TEST_F(LibUsbEventsTest, ItsThreadTakesNoSignalOfTheHost) {
 /// Each is in libusb, or about to go there, when the other wakes it.
 TEST_F(LibUsbEventsTest, ThreadsThatWakeEachOtherLoseNoSignal) {
     const OwnedHandle echo(StartThread(&LibUsbEventsTest::Echo, this));
-    Posix::WorkOffInWaits(events);
+    Posix::WorkOffInWaits(events_);
     for (int i = 0; i < Rounds; ++i) {
-        SignalEvent(there.Get());
-        ASSERT_EQ(Wait(back.Get(), LongTimeout), WaitResult::Signalled) << "round " << i;
+        SignalEvent(there_.Get());
+        ASSERT_EQ(Wait(back_.Get(), LongTimeout), WaitResult::Signalled) << "round " << i;
     }
     EXPECT_EQ(Wait(echo.Get(), LongTimeout), WaitResult::Signalled);
 }
 
 TEST_F(LibUsbEventsTest, AWaitEndsInTimeAndOutlastsTheEvents) {
-    Posix::WorkOffInWaits(events);
-    EXPECT_EQ(Wait(back.Get(), 30), WaitResult::TimedOut);
+    Posix::WorkOffInWaits(events_);
+    EXPECT_EQ(Wait(back_.Get(), 30), WaitResult::TimedOut);
     const OwnedHandle echo(StartThread(&LibUsbEventsTest::Echo, this));
     for (int i = 0; i < Rounds; ++i) {
         if (i == Rounds / 2) {
-            events->HandleAlways();
+            events_->HandleAlways();
         } else if (i == Rounds / 2 + 10) {
-            events->Stop();
+            events_->Stop();
         }
-        SignalEvent(there.Get());
-        ASSERT_EQ(Wait(back.Get(), LongTimeout), WaitResult::Signalled) << "round " << i;
+        SignalEvent(there_.Get());
+        ASSERT_EQ(Wait(back_.Get(), LongTimeout), WaitResult::Signalled) << "round " << i;
     }
     EXPECT_EQ(Wait(echo.Get(), LongTimeout), WaitResult::Signalled);
 }
 
 /// An aborted transfer, or the button's, may end when nobody waits.
 TEST_F(LibUsbEventsTest, AfterALongWaitTheirOwnThreadHandlesThemAgain) {
-    Posix::WorkOffInWaits(events);
-    EXPECT_EQ(Wait(back.Get(), 50), WaitResult::TimedOut);
+    Posix::WorkOffInWaits(events_);
+    EXPECT_EQ(Wait(back_.Get(), 50), WaitResult::TimedOut);
     const auto patienceEnds = std::chrono::steady_clock::now() + std::chrono::milliseconds(LongTimeout);
-    while (libusb_event_handler_active(context) == 0 && std::chrono::steady_clock::now() < patienceEnds) {
+    while (libusb_event_handler_active(context_) == 0 && std::chrono::steady_clock::now() < patienceEnds) {
         std::this_thread::sleep_for(std::chrono::milliseconds(1));
     }
-    EXPECT_NE(libusb_event_handler_active(context), 0);
+    EXPECT_NE(libusb_event_handler_active(context_), 0);
 }
 
 }  // namespace

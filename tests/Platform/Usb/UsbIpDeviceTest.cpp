@@ -64,9 +64,9 @@ class UsbIpDeviceTest : public testing::Test {
                 ClosePeer();
                 int files[2] = {-1, -1};
                 EXPECT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, files));
-                peer = files[1];
+                peer_ = files[1];
                 const timeval patience{10, 0};
-                setsockopt(peer, SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof patience);
+                setsockopt(peer_, SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof patience);
                 PeerSends(firstBytes);
                 return files[0];
             },
@@ -79,17 +79,17 @@ class UsbIpDeviceTest : public testing::Test {
         return device;
     }
     void ClosePeer() {
-        if (peer >= 0) {
-            close(std::exchange(peer, -1));
+        if (peer_ >= 0) {
+            close(std::exchange(peer_, -1));
         }
     }
     template <class Array>
     void PeerSends(const Array& bytes) {
-        EXPECT_EQ(static_cast<ssize_t>(bytes.size()), send(peer, bytes.data(), bytes.size(), MSG_NOSIGNAL));
+        EXPECT_EQ(static_cast<ssize_t>(bytes.size()), send(peer_, bytes.data(), bytes.size(), MSG_NOSIGNAL));
     }
     Bytes PeerReceives(std::size_t size) {
         Bytes bytes(size);
-        const ssize_t count = recv(peer, bytes.data(), size, MSG_WAITALL);
+        const ssize_t count = recv(peer_, bytes.data(), size, MSG_WAITALL);
         bytes.resize(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
         return bytes;
     }
@@ -106,7 +106,7 @@ class UsbIpDeviceTest : public testing::Test {
         return std::get<Kind>(*packet);
     }
 
-    int peer = -1;
+    int peer_ = -1;
 };
 
 TEST_F(UsbIpDeviceTest, ItsThreadTakesNoSignalOfTheHost) {

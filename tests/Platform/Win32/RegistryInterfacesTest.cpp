@@ -50,21 +50,21 @@ class OldRegistry : public testing::Test {
   protected:
     OldRegistry() {
         OverrideVersionRecord(VersionRecord{2, 4, 0, 1381, "Service Pack 6"});
-        RegCreateKeyExA(HKEY_LOCAL_MACHINE, Path, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr);
+        RegCreateKeyExA(HKEY_LOCAL_MACHINE, Path, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key_, nullptr);
     }
     ~OldRegistry() override {
-        RegCloseKey(key);
+        RegCloseKey(key_);
         RegDeleteKeyA(HKEY_LOCAL_MACHINE, Path);
         OverrideVersionRecord(std::nullopt);
     }
 
     void Add(const std::string& valueName) {
         const BYTE data[] = {1, 0, 0, 0};
-        ASSERT_EQ(RegSetValueExA(key, valueName.c_str(), 0, REG_DWORD, data, sizeof data), ERROR_SUCCESS);
+        ASSERT_EQ(RegSetValueExA(key_, valueName.c_str(), 0, REG_DWORD, data, sizeof data), ERROR_SUCCESS);
     }
 
     static constexpr const char* Path = "System\\CurrentControlSet\\Control\\WinDK\\DeviceNotification";
-    HKEY key = nullptr;
+    HKEY key_ = nullptr;
 };
 
 TEST_F(OldRegistry, ValuesOfTheClassAreTheInterfaces) {

@@ -34,8 +34,8 @@ class ConditionTest : public testing::Test {
   protected:
     ~ConditionTest() override {
         Platform::InstallCallFilter({});
-        condition.broadcast();  // lets go whom a failed test has left
-        for (std::thread& thread : threads) {
+        condition_.broadcast();  // lets go whom a failed test has left
+        for (std::thread& thread : threads_) {
             thread.join();
         }
     }
@@ -43,43 +43,43 @@ class ConditionTest : public testing::Test {
     /// Returns once all of them are in `Wait`: they hold the mutex until they are counted there.
     void StartWaiters(int count) {
         for (int i = 0; i < count; ++i) {
-            threads.emplace_back([this] {
-                const ScopedLock lock(mutex);
-                ++waiting;
+            threads_.emplace_back([this] {
+                const ScopedLock lock(mutex_);
+                ++waiting_;
                 try {
-                    condition.Wait(0);
+                    condition_.Wait(0);
                 } catch (const ResourceException& exception) {
-                    failure = exception.what();
-                    mutex.Lock();  // the scope's unlock finds nothing to unlock otherwise
+                    failure_ = exception.what();
+                    mutex_.Lock();  // the scope's unlock finds nothing to unlock otherwise
                 }
-                --waiting;
-                ++woken;
+                --waiting_;
+                ++woken_;
             });
         }
-        Await([this, count] { return waiting == count; });
+        Await([this, count] { return waiting_ == count; });
     }
 
     template <class State>
     bool Await(State state) {
         for (int i = 0; i < 5000; ++i) {
             {
-                const ScopedLock lock(mutex);
+                const ScopedLock lock(mutex_);
                 if (state()) {
                     return true;
                 }
             }
             std::this_thread::sleep_for(1ms);
         }
-        ADD_FAILURE() << "waited in vain: " << waiting << " waiting, " << woken << " woken";
+        ADD_FAILURE() << "waited in vain: " << waiting_ << " waiting, " << woken_ << " woken";
         return false;
     }
 
     /// So many wake up, and no more a little later.
     void ExpectWoken(int count) {
-        Await([this, count] { return woken == count; });
+        Await([this, count] { return woken_ == count; });
         std::this_thread::sleep_for(ALittle);
-        const ScopedLock lock(mutex);
-        EXPECT_EQ(woken, count);
+        const ScopedLock lock(mutex_);
+        EXPECT_EQ(woken_, count);
     }
 
     /// Makes a call fail, on this thread only when others are in the middle of theirs.
@@ -90,24 +90,24 @@ class ConditionTest : public testing::Test {
         });
     }
 
-    Mutex mutex{UniqueName()};
-    Condition condition{mutex};
+    Mutex mutex_{UniqueName()};
+    Condition condition_{mutex_};
     // Guarded by `mutex`.
-    int waiting = 0;
-    int woken = 0;
-    std::string failure;
+    int waiting_ = 0;
+    int woken_ = 0;
+    std::string failure_;
 
   private:
-    std::vector<std::thread> threads;
+    std::vector<std::thread> threads_;
 };
 
 TEST_F(ConditionTest, SignalWakesOneAndIsForgottenWithoutAWaiter) {
-    condition.signal();
-    condition.broadcast();
+    condition_.signal();
+    condition_.broadcast();
     StartWaiters(3);
     ExpectWoken(0);
     for (int expected = 1; expected <= 3; ++expected) {
-        condition.signal();
+        condition_.signal();
         ExpectWoken(expected);
     }
 }
@@ -116,17 +116,17 @@ TEST_F(ConditionTest, BroadcastReturnsWhenAllHaveLeftAndLeavesNothingBehind) {
     for (int round = 1; round <= 2; ++round) {
         StartWaiters(3);
         {
-            const ScopedLock lock(mutex);
-            condition.broadcast();
-            EXPECT_EQ(woken, 3 * (round - 1)) << "the mutex is still held here";
+            const ScopedLock lock(mutex_);
+            condition_.broadcast();
+            EXPECT_EQ(woken_, 3 * (round - 1)) << "the mutex is still held here";
         }
-        Await([&] { return woken == 3 * round; });
+        Await([&] { return woken_ == 3 * round; });
     }
     StartWaiters(2);
     ExpectWoken(6);  // no wake-up is left over
-    condition.signal();
+    condition_.signal();
     ExpectWoken(7);  // nor did the signal pass for a broadcast
-    condition.broadcast();
+    condition_.broadcast();
     ExpectWoken(8);
 }
 
@@ -144,7 +144,7 @@ TEST_F(ConditionTest, CannotBeMadeWithoutItsObjects) {
         MakeFail(call);
         SCOPED_TRACE(call);
         ExpectThrow<ResourceException>("ConditionImpl::ConditionImpl() can't create!",
-                                       [&] { const Condition refused(mutex); });
+                                       [&] { const Condition refused(mutex_); });
     }
 }
 
@@ -159,29 +159,29 @@ TEST_F(ConditionTest, FailedReleaseUnlocksTheMutexAndKeepsNothingLocked) {
          {Case{"signal", &Condition::signal, "Condition::signal() invalid condition!"},
           Case{"broadcast", &Condition::broadcast, "Condition::broadcast() unable to release semaphore!"}}) {
         SCOPED_TRACE(row.name);
-        mutex.Lock();
+        mutex_.Lock();
         MakeFail("ReleaseSemaphore");
-        ExpectThrow<ResourceException>(row.message, [&] { (condition.*row.operation)(); });
+        ExpectThrow<ResourceException>(row.message, [&] { (condition_.*row.operation)(); });
         Platform::InstallCallFilter({});
         std::thread([&] {
-            EXPECT_TRUE(mutex.TryLock(1000)) << "must have been unlocked";
-            mutex.Unlock();
+            EXPECT_TRUE(mutex_.TryLock(1000)) << "must have been unlocked";
+            mutex_.Unlock();
         }).join();
     }
     ExpectWoken(0);
-    std::thread([this] { condition.signal(); }).join();  // another thread gets into the state's own lock
+    std::thread([this] { condition_.signal(); }).join();  // another thread gets into the state's own lock
     ExpectWoken(1);
-    condition.broadcast();
+    condition_.broadcast();
     ExpectWoken(2);
 }
 
 TEST_F(ConditionTest, BroadcastReportsAnEventItCannotWaitFor) {
     StartWaiters(2);
-    mutex.Lock();
+    mutex_.Lock();
     MakeFail("Wait");
-    ExpectThrow<ResourceException>("Condition::broadcast() invalid event!", [&] { condition.broadcast(); });
+    ExpectThrow<ResourceException>("Condition::broadcast() invalid event!", [&] { condition_.broadcast(); });
     Platform::InstallCallFilter({});
-    Await([this] { return woken == 2; });  // which needs the mutex that the failure has unlocked
+    Await([this] { return woken_ == 2; });  // which needs the mutex that the failure has unlocked
 }
 
 TEST_F(ConditionTest, WaiterThatCannotTakeTheMutexAgainSaysSo) {
@@ -205,13 +205,13 @@ TEST_F(ConditionTest, WaiterThatCannotTakeTheMutexAgainSaysSo) {
         StartWaiters(1);
         onceAtTheWaiters(row.call, [this, fails = row.fails] {
             if (!fails) {
-                std::thread([this] { mutex.Lock(); }).join();
+                std::thread([this] { mutex_.Lock(); }).join();
             }
             return fails ? Platform::Errors::InvalidHandle : Platform::Errors::Success;
         });
-        (condition.*row.wake)();
-        Await([this] { return waiting == 0; });
-        EXPECT_EQ(std::exchange(failure, ""), "Condition::Wait() invalid mutex! (must be a real mutex)");
+        (condition_.*row.wake)();
+        Await([this] { return waiting_ == 0; });
+        EXPECT_EQ(std::exchange(failure_, ""), "Condition::Wait() invalid mutex! (must be a real mutex)");
     }
     StartWaiters(1);
     std::atomic<bool> hasLeft = false;
@@ -220,7 +220,7 @@ TEST_F(ConditionTest, WaiterThatCannotTakeTheMutexAgainSaysSo) {
         hasLeft = true;
         return Platform::Errors::Success;
     });
-    condition.broadcast();
+    condition_.broadcast();
     EXPECT_TRUE(hasLeft) << "what the failures left behind passed for the end of this broadcast";
 }
 

@@ -26,19 +26,19 @@ auto Find(Store& datastore, std::uint16_t id) {
 
 }  // namespace
 
-Properties::Properties(const std::string& nameOfCollection) try : name(nameOfCollection) {}
+Properties::Properties(const std::string& nameOfCollection) try : name_(nameOfCollection) {}
 TRACED
 
-void Properties::SetName(const std::string& newName) try { name = newName; }
+void Properties::SetName(const std::string& newName) try { name_ = newName; }
 TRACED
 
 bool Properties::Contains(std::uint16_t id) const {
-    return Find(datastore, id) != datastore.end();
+    return Find(datastore_, id) != datastore_.end();
 }
 
 const Property& Properties::GetProperty(std::uint16_t id) const try {
-    const auto entry = Find(datastore, id);
-    if (entry == datastore.end()) {
+    const auto entry = Find(datastore_, id);
+    if (entry == datastore_.end()) {
         throw ResourceException("id " + lexical_cast<std::string>(id) + " doesn't exist", Here());
     }
     return entry->second;
@@ -46,8 +46,8 @@ const Property& Properties::GetProperty(std::uint16_t id) const try {
 TRACED
 
 Property& Properties::GetProperty(std::uint16_t id) try {
-    const auto entry = Find(datastore, id);
-    if (entry == datastore.end()) {
+    const auto entry = Find(datastore_, id);
+    if (entry == datastore_.end()) {
         throw ResourceException("id " + lexical_cast<std::string>(id) + " doesn't exist", Here());
     }
     return entry->second;
@@ -55,17 +55,17 @@ Property& Properties::GetProperty(std::uint16_t id) try {
 TRACED
 
 void Properties::SetProperty(std::uint16_t id, const Property& value) try {
-    if (const auto entry = Find(datastore, id); entry != datastore.end()) {
+    if (const auto entry = Find(datastore_, id); entry != datastore_.end()) {
         entry->second = value;
     } else {
-        datastore.emplace_back(id, value);
+        datastore_.emplace_back(id, value);
     }
 }
 TRACED
 
 std::list<std::uint16_t> Properties::GetPropertyKeys() const try {
     std::list<std::uint16_t> keys;
-    for (const auto& entry : datastore) {
+    for (const auto& entry : datastore_) {
         keys.push_back(entry.first);
     }
     return keys;
@@ -73,8 +73,8 @@ std::list<std::uint16_t> Properties::GetPropertyKeys() const try {
 TRACED
 
 std::size_t Properties::SizeOf(bool valuesOnly) const {
-    std::size_t size = valuesOnly ? 0 : IdentifierSize * datastore.size();
-    for (const auto& entry : datastore) {
+    std::size_t size = valuesOnly ? 0 : IdentifierSize * datastore_.size();
+    for (const auto& entry : datastore_) {
         size += entry.second.SizeOf();
     }
     return size;
@@ -87,7 +87,7 @@ void Properties::Dump(std::vector<std::uint8_t>::iterator first, std::vector<std
         throw ResourceException("Configuration data dump target too small", Here());
     }
     std::uint8_t* target = size == 0 ? nullptr : &*first;
-    for (const auto& [id, value] : datastore) {
+    for (const auto& [id, value] : datastore_) {
         if (!valuesOnly) {
             EndianConversion::ShortToByteArray(id, target, bigEndian);
             target += IdentifierSize;

@@ -20,12 +20,12 @@ class Properties final {
     Properties() = default;
     explicit Properties(const std::string& nameOfCollection);
 
-    const std::string& GetName() const { return name; }
+    const std::string& GetName() const { return name_; }
     void SetName(const std::string& newName);
 
-    std::uint16_t GetItemCount() const { return static_cast<std::uint16_t>(datastore.size()); }
-    const Datastore& GetDatastore() const { return datastore; }
-    Datastore& GetDatastore() { return datastore; }
+    std::uint16_t GetItemCount() const { return static_cast<std::uint16_t>(datastore_.size()); }
+    const Datastore& GetDatastore() const { return datastore_; }
+    Datastore& GetDatastore() { return datastore_; }
     bool Contains(std::uint16_t id) const;
     /// An absent identifier is refused with `ResourceException` "id N doesn't exist".
     const Property& GetProperty(std::uint16_t id) const;
@@ -46,8 +46,8 @@ class Properties final {
     static std::string GetExceptionText(std::uint16_t id);
 
   private:
-    Datastore datastore;
-    std::string name;
+    Datastore datastore_;
+    std::string name_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Generic::Configuration

@@ -16,22 +16,22 @@ constexpr const char* InvalidType = "Invalid configuration data type.";
 
 }  // namespace
 
-Property::Property(const std::vector<float>& values) try : floats(values), type(TypeFloatVector) {}
+Property::Property(const std::vector<float>& values) try : floats_(values), type_(TypeFloatVector) {}
 TRACED
 
-Property::Property(const std::vector<std::int32_t>& values) try : longs(values), type(TypeLongVector) {}
+Property::Property(const std::vector<std::int32_t>& values) try : longs_(values), type_(TypeLongVector) {}
 TRACED
 
-Property::Property(float value) try : floats(1, value), type(TypeFloat) {}
+Property::Property(float value) try : floats_(1, value), type_(TypeFloat) {}
 TRACED
 
-Property::Property(std::int32_t value) try : longs(1, value), type(TypeLong) {}
+Property::Property(std::int32_t value) try : longs_(1, value), type_(TypeLong) {}
 TRACED
 
-Property::Property(std::int16_t value) try : longs(1, value), type(TypeLong) {}
+Property::Property(std::int16_t value) try : longs_(1, value), type_(TypeLong) {}
 TRACED
 
-Property::Property(std::int8_t value) try : longs(1, value), type(TypeLong) {}
+Property::Property(std::int8_t value) try : longs_(1, value), type_(TypeLong) {}
 TRACED
 
 Property& Property::Assign(float value) try {
@@ -72,19 +72,19 @@ TRACED
 
 Property& Property::Assign(std::span<const std::uint8_t> bytes, bool bigEndian) try {
     const std::size_t count = bytes.size() / ElementSize;
-    switch (type) {
+    switch (type_) {
         case TypeLong:
         case TypeLongVector:
-            longs.resize(count);
+            longs_.resize(count);
             for (std::size_t i = 0; i < count; ++i) {
-                EndianConversion::ByteArrayToLong(&bytes[ElementSize * i], longs[i], bigEndian);
+                EndianConversion::ByteArrayToLong(&bytes[ElementSize * i], longs_[i], bigEndian);
             }
             return *this;
         case TypeFloat:
         case TypeFloatVector:
-            floats.resize(count);
+            floats_.resize(count);
             for (std::size_t i = 0; i < count; ++i) {
-                EndianConversion::ByteArrayToFloat(&bytes[ElementSize * i], floats[i], bigEndian);
+                EndianConversion::ByteArrayToFloat(&bytes[ElementSize * i], floats_[i], bigEndian);
             }
             return *this;
         case TypeNone:
@@ -95,27 +95,27 @@ Property& Property::Assign(std::span<const std::uint8_t> bytes, bool bigEndian) 
 TRACED
 
 void Property::AssignInternal(const std::vector<float>& values, PropertyType newType) try {
-    floats = values;
-    longs.clear();
-    type = newType;
+    floats_ = values;
+    longs_.clear();
+    type_ = newType;
 }
 TRACED
 
 void Property::AssignInternal(const std::vector<std::int32_t>& values, PropertyType newType) try {
-    longs = values;
-    floats.clear();
-    type = newType;
+    longs_ = values;
+    floats_.clear();
+    type_ = newType;
 }
 TRACED
 
 std::size_t Property::SizeOf() const {
-    switch (type) {
+    switch (type_) {
         case TypeLong:
         case TypeLongVector:
-            return ElementSize * longs.size();
+            return ElementSize * longs_.size();
         case TypeFloat:
         case TypeFloatVector:
-            return ElementSize * floats.size();
+            return ElementSize * floats_.size();
         case TypeNone:
             break;
     }
@@ -123,23 +123,23 @@ std::size_t Property::SizeOf() const {
 }
 
 std::int32_t Property::AsLong() const try {
-    if (longs.empty()) {
+    if (longs_.empty()) {
         throw RuntimeException(InvalidType, Here());
     }
-    return longs.front();
+    return longs_.front();
 }
 TRACED
 
 float Property::AsFloat() const try {
-    if (floats.empty()) {
+    if (floats_.empty()) {
         throw RuntimeException(InvalidType, Here());
     }
-    return floats.front();
+    return floats_.front();
 }
 TRACED
 
 std::vector<std::uint8_t> Property::AsByteVector(bool bigEndian) const try {
-    if (type < TypeLong || type > TypeFloatVector) {
+    if (type_ < TypeLong || type_ > TypeFloatVector) {
         throw RuntimeException(InvalidType, Here());
     }
     std::vector<std::uint8_t> bytes(SizeOf());
@@ -149,17 +149,17 @@ std::vector<std::uint8_t> Property::AsByteVector(bool bigEndian) const try {
 TRACED
 
 void Property::WriteBytes(std::uint8_t* bytes, bool bigEndian) const {
-    switch (type) {
+    switch (type_) {
         case TypeLong:
         case TypeLongVector:
-            for (const std::int32_t value : longs) {
+            for (const std::int32_t value : longs_) {
                 EndianConversion::LongToByteArray(value, bytes, bigEndian);
                 bytes += ElementSize;
             }
             return;
         case TypeFloat:
         case TypeFloatVector:
-            for (const float& value : floats) {
+            for (const float& value : floats_) {
                 EndianConversion::FloatToByteArray(value, bytes, bigEndian);
                 bytes += ElementSize;
             }

@@ -42,7 +42,7 @@ class Property final {
     void AssignInternal(const std::vector<float>& values, PropertyType newType);
     void AssignInternal(const std::vector<std::int32_t>& values, PropertyType newType);
 
-    PropertyType GetType() const { return type; }
+    PropertyType GetType() const { return type_; }
     /// Bytes of `AsByteVector`; 0 without a type.
     std::size_t SizeOf() const;
 
@@ -50,8 +50,8 @@ class Property final {
     std::int32_t AsLong() const;
     float AsFloat() const;
     /// Empty when the value is of the other kind.
-    const std::vector<std::int32_t>& AsLongVector() const { return longs; }
-    const std::vector<float>& AsFloatVector() const { return floats; }
+    const std::vector<std::int32_t>& AsLongVector() const { return longs_; }
+    const std::vector<float>& AsFloatVector() const { return floats_; }
     /// 4 bytes for each element. Without a type: `RuntimeException`.
     std::vector<std::uint8_t> AsByteVector(bool bigEndian) const;
     /// The same into `bytes`, which has room for `SizeOf` bytes.
@@ -59,9 +59,9 @@ class Property final {
 
   private:
     // At most one of the two is non-empty: the one that the type names.
-    std::vector<float> floats;
-    std::vector<std::int32_t> longs;
-    PropertyType type = TypeNone;
+    std::vector<float> floats_;
+    std::vector<std::int32_t> longs_;
+    PropertyType type_ = TypeNone;
 };
 
 }  // namespace Varnholt::DeviceDriver::Generic::Configuration

@@ -21,20 +21,20 @@ class DeviceDriverException : public RuntimeException {
   public:
     using RuntimeException::RuntimeException;
     DeviceDriverException(const std::string& message, const std::string& location, std::uint32_t failureCode)
-        : RuntimeException(message, location), code(failureCode) {}
+        : RuntimeException(message, location), code_(failureCode) {}
     DeviceDriverException(const std::string& message, const std::string& location,
                           const Shortfall& missingData)
-        : RuntimeException(message, location), shortfall(missingData) {}
+        : RuntimeException(message, location), shortfall_(missingData) {}
 
     /// The operating system's (`Platform::Errors`) or the USBIO driver's (`Protocol::UsbIoDriver::Status`)
     /// number for the failure; the two ranges do not meet.
-    std::optional<std::uint32_t> Code() const { return code; }
+    std::optional<std::uint32_t> Code() const { return code_; }
     /// Of a transfer that succeeded and moved another number of bytes.
-    std::optional<Shortfall> MissingData() const { return shortfall; }
+    std::optional<Shortfall> MissingData() const { return shortfall_; }
 
   private:
-    std::optional<std::uint32_t> code;
-    std::optional<Shortfall> shortfall;
+    std::optional<std::uint32_t> code_;
+    std::optional<Shortfall> shortfall_;
 };
 /// Stored or received data that does not fit.
 class DataException final : public DeviceDriverException {

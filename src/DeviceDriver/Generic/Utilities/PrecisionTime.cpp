@@ -23,17 +23,17 @@ std::int32_t Difference(std::int32_t a, std::int32_t b) {
 }  // namespace
 
 PrecisionTime::PrecisionTime(std::int32_t seconds, std::int32_t microseconds)
-    : impl(new PrecisionTimeImpl{seconds, microseconds}) {}
+    : impl_(new PrecisionTimeImpl{seconds, microseconds}) {}
 
-PrecisionTime::PrecisionTime(const PrecisionTime& other) : impl(new PrecisionTimeImpl(*other.impl)) {}
+PrecisionTime::PrecisionTime(const PrecisionTime& other) : impl_(new PrecisionTimeImpl(*other.impl_)) {}
 
 PrecisionTime& PrecisionTime::operator=(const PrecisionTime& other) {
-    *impl = *other.impl;
+    *impl_ = *other.impl_;
     return *this;
 }
 
 void PrecisionTime::Set(std::int32_t seconds, std::int32_t microseconds) {
-    *impl = {seconds, microseconds};
+    *impl_ = {seconds, microseconds};
 }
 
 void PrecisionTime::SetToNow() {
@@ -58,21 +58,21 @@ void PrecisionTime::SetFromReadings(std::uint64_t frequency, std::uint64_t count
 }
 
 PrecisionTime& PrecisionTime::operator+=(const PrecisionTime& other) {
-    impl->seconds = Sum(impl->seconds, other.impl->seconds);
-    impl->microseconds = Sum(impl->microseconds, other.impl->microseconds);
-    if (impl->microseconds >= MicrosecondsPerSecond) {
-        impl->seconds = Sum(impl->seconds, 1);
-        impl->microseconds -= MicrosecondsPerSecond;
+    impl_->seconds = Sum(impl_->seconds, other.impl_->seconds);
+    impl_->microseconds = Sum(impl_->microseconds, other.impl_->microseconds);
+    if (impl_->microseconds >= MicrosecondsPerSecond) {
+        impl_->seconds = Sum(impl_->seconds, 1);
+        impl_->microseconds -= MicrosecondsPerSecond;
     }
     return *this;
 }
 
 PrecisionTime& PrecisionTime::operator-=(const PrecisionTime& other) {
-    impl->seconds = Difference(impl->seconds, other.impl->seconds);
-    impl->microseconds = Difference(impl->microseconds, other.impl->microseconds);
-    if (impl->microseconds < 0) {
-        impl->seconds = Difference(impl->seconds, 1);
-        impl->microseconds += MicrosecondsPerSecond;
+    impl_->seconds = Difference(impl_->seconds, other.impl_->seconds);
+    impl_->microseconds = Difference(impl_->microseconds, other.impl_->microseconds);
+    if (impl_->microseconds < 0) {
+        impl_->seconds = Difference(impl_->seconds, 1);
+        impl_->microseconds += MicrosecondsPerSecond;
     }
     return *this;
 }

@@ -40,18 +40,18 @@ class PrecisionTime final {
     friend PrecisionTime operator-(const PrecisionTime& a, const PrecisionTime& b) {
         return PrecisionTime(a) -= b;
     }
-    friend bool operator==(const PrecisionTime& a, const PrecisionTime& b) { return *a.impl == *b.impl; }
-    friend auto operator<=>(const PrecisionTime& a, const PrecisionTime& b) { return *a.impl <=> *b.impl; }
+    friend bool operator==(const PrecisionTime& a, const PrecisionTime& b) { return *a.impl_ == *b.impl_; }
+    friend auto operator<=>(const PrecisionTime& a, const PrecisionTime& b) { return *a.impl_ <=> *b.impl_; }
 
-    std::int32_t GetSeconds() const { return impl->seconds; }
-    std::int32_t GetMilliseconds() const { return impl->microseconds / 1000; }
+    std::int32_t GetSeconds() const { return impl_->seconds; }
+    std::int32_t GetMilliseconds() const { return impl_->microseconds / 1000; }
     /// Within the millisecond.
-    std::int32_t GetMicroseconds() const { return impl->microseconds % 1000; }
+    std::int32_t GetMicroseconds() const { return impl_->microseconds % 1000; }
     /// The time from this value until now.
     void GetElapsed(std::int32_t& seconds, std::int32_t& milliseconds, std::int32_t& microseconds) const;
 
   private:
-    Varnholt::Utilities::Tools::SmartPointer<PrecisionTimeImpl> impl;
+    Varnholt::Utilities::Tools::SmartPointer<PrecisionTimeImpl> impl_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Generic::Utilities

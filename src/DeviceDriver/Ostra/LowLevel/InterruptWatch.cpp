@@ -24,32 +24,32 @@ bool HasEnded(Platform::Handle thread, std::uint32_t limit) {
 }  // namespace
 
 bool InterruptWatch::HasEvents() const {
-    return started && wake;
+    return started_ && wake_;
 }
 
 void InterruptWatch::SetReceiver(std::shared_ptr<EventListener> receiver) {
-    const ScopedLock held(lock);
-    listener.swap(receiver);
+    const ScopedLock held(lock_);
+    listener_.swap(receiver);
 }
 
 bool InterruptWatch::IsTouched() {
-    const ScopedLock held(lock);
-    return touched;
+    const ScopedLock held(lock_);
+    return touched_;
 }
 
 InterruptWatch::State InterruptWatch::GetState() {
-    const ScopedLock held(lock);
-    return state;
+    const ScopedLock held(lock_);
+    return state_;
 }
 
 bool InterruptWatch::IsOwnThread() {
-    const ScopedLock held(lock);
-    return threadId == std::this_thread::get_id();
+    const ScopedLock held(lock_);
+    return threadId_ == std::this_thread::get_id();
 }
 
 bool InterruptWatch::WasEndedByForce() {
-    const ScopedLock held(lock);
-    return endedByForce;
+    const ScopedLock held(lock_);
+    return endedByForce_;
 }
 
 Platform::OwnedHandle InterruptWatch::Launch() {
@@ -57,27 +57,27 @@ Platform::OwnedHandle InterruptWatch::Launch() {
         return {};
     }
     auto argument = std::make_unique<std::shared_ptr<InterruptWatch>>(shared_from_this());
-    const ScopedLock held(lock);  // the thread finds its state set
+    const ScopedLock held(lock_);  // the thread finds its state set
     Platform::OwnedHandle thread(Platform::StartThread(ThreadEntry, argument.get()));
     if (thread) {
-        state = State::Running;
+        state_ = State::Running;
         static_cast<void>(argument.release());  // the thread's
     }
     return thread;
 }
 
 bool InterruptWatch::AwaitStart() {
-    return Platform::Wait(started.Get(), StartLimit) == WaitResult::Signalled;
+    return Platform::Wait(started_.Get(), StartLimit) == WaitResult::Signalled;
 }
 
 void InterruptWatch::RequestStop() {
-    const ScopedLock held(lock);
-    if (state == State::Running) {
-        state = State::StopRequested;
+    const ScopedLock held(lock_);
+    if (state_ == State::Running) {
+        state_ = State::StopRequested;
     }
-    endRequested = true;
+    endRequested_ = true;
     // Cancelling from here would not reach the read, which is the thread's: woken, it cancels it itself.
-    Platform::SignalEvent(wake.Get());
+    Platform::SignalEvent(wake_.Get());
 }
 
 bool InterruptWatch::End(Platform::OwnedHandle& thread) {
@@ -104,10 +104,10 @@ bool InterruptWatch::End(Platform::OwnedHandle& thread) {
 
 bool InterruptWatch::EndByForce(Platform::Handle thread) {
     std::shared_ptr<EventListener> dropped;
-    const ScopedLock held(lock);  // so that the thread does not hold it
-    dropped.swap(listener);
-    endedByForce = Platform::EndThreadByForce(thread, ForcedExitCode);
-    return endedByForce;
+    const ScopedLock held(lock_);  // so that the thread does not hold it
+    dropped.swap(listener_);
+    endedByForce_ = Platform::EndThreadByForce(thread, ForcedExitCode);
+    return endedByForce_;
 }
 
 std::uint32_t InterruptWatch::ThreadEntry(void* argument) {
@@ -122,32 +122,32 @@ std::uint32_t InterruptWatch::ThreadEntry(void* argument) {
 
 void InterruptWatch::Run() {
     {
-        const ScopedLock held(lock);
-        threadId = std::this_thread::get_id();
+        const ScopedLock held(lock_);
+        threadId_ = std::this_thread::get_id();
     }
     try {
         Listen();
     } catch (...) {  // whatever it was, it ends the thread
     }
-    const ScopedLock held(lock);
-    state = State::Ended;
-    threadId = {};
+    const ScopedLock held(lock_);
+    state_ = State::Ended;
+    threadId_ = {};
 }
 
 void InterruptWatch::ReportStart() {
-    Platform::SignalEvent(started.Get());
+    Platform::SignalEvent(started_.Get());
     Platform::SleepMilliseconds(0);
 }
 
 void InterruptWatch::DispatchEvent(std::uint32_t count) {
     std::shared_ptr<EventListener> receiver;
     {
-        const ScopedLock held(lock);
+        const ScopedLock held(lock_);
         if (count != 0) {
-            touched = true;
+            touched_ = true;
         }
-        if (count != 0 || state == State::Running) {
-            receiver = listener;
+        if (count != 0 || state_ == State::Running) {
+            receiver = listener_;
         }
     }
     if (receiver) {

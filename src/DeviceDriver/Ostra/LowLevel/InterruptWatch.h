@@ -51,13 +51,13 @@ class InterruptWatch : public std::enable_shared_from_this<InterruptWatch> {
     /// nothing was read.
     void DispatchEvent(std::uint32_t count);
     /// Signalled when the end is requested, to end a read that waits.
-    Platform::Handle Wake() const { return wake.Get(); }
-    const std::atomic<bool>& EndRequested() const { return endRequested; }
+    Platform::Handle Wake() const { return wake_.Get(); }
+    const std::atomic<bool>& EndRequested() const { return endRequested_; }
     /// The thread runs no further instruction; it may hold locks of the derived class for ever.
     bool WasEndedByForce();
 
     /// Guards what the derived class shares between threads, too; nobody is called with it held.
-    Varnholt::Utilities::Multithreading::Mutex lock{""};
+    Varnholt::Utilities::Multithreading::Mutex lock_{""};
 
   private:
     enum class State { Running, StopRequested, Ended };
@@ -69,15 +69,15 @@ class InterruptWatch : public std::enable_shared_from_this<InterruptWatch> {
     void RequestStop();
     bool EndByForce(Platform::Handle thread);
 
-    const Platform::OwnedHandle started{Platform::MakeAutoResetEvent()};
-    const Platform::OwnedHandle wake{Platform::MakeAutoResetEvent()};
-    std::atomic<bool> endRequested = false;
+    const Platform::OwnedHandle started_{Platform::MakeAutoResetEvent()};
+    const Platform::OwnedHandle wake_{Platform::MakeAutoResetEvent()};
+    std::atomic<bool> endRequested_ = false;
     // Guarded by `lock`:
-    State state = State::Ended;
-    bool touched = false;
-    bool endedByForce = false;
-    std::shared_ptr<Generic::EventListener> listener;
-    std::thread::id threadId;
+    State state_ = State::Ended;
+    bool touched_ = false;
+    bool endedByForce_ = false;
+    std::shared_ptr<Generic::EventListener> listener_;
+    std::thread::id threadId_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -95,34 +95,36 @@ void PellandoEAT::ParseBuffer(const std::uint8_t* buffer) try {
         newLength > TableLayout::LongestLength) {
         throw DataException(CorruptTable, Here());
     }
-    version = newVersion;
-    length = newLength;
+    version_ = newVersion;
+    length_ = newLength;
     std::bitset<std::numeric_limits<std::uint16_t>::max() + 1> seen;
-    for (const auto& entry : datastore.GetDatastore()) {
+    for (const auto& entry : datastore_.GetDatastore()) {
         seen.set(entry.first);
     }
     for (std::uint32_t offset = HeaderSize;
-         offset < length && offset + TableLayout::EntrySize <= EepromMap::TableArea;
+         offset < length_ && offset + TableLayout::EntrySize <= EepromMap::TableArea;
          offset += TableLayout::EntrySize) {
         std::uint16_t id = 0;
         std::int32_t address = 0;
         EndianConversion::ByteArrayToShort(buffer + offset + TableLayout::EntryIdentifier, id, true);
         EndianConversion::ByteArrayToLong(buffer + offset + TableLayout::EntryAddress, address, true);
         if (seen[id]) {
-            datastore.SetProperty(id, Property(address));
+            datastore_.SetProperty(id, Property(address));
         } else {
-            datastore.GetDatastore().emplace_back(id, Property(address));
+            datastore_.GetDatastore().emplace_back(id, Property(address));
             seen.set(id);
         }
     }
 }
 TRACED
 
-std::int32_t PellandoEAT::AddressOf(std::uint16_t id) const try { return datastore.GetProperty(id).AsLong(); }
+std::int32_t PellandoEAT::AddressOf(std::uint16_t id) const try {
+    return datastore_.GetProperty(id).AsLong();
+}
 TRACED
 
 std::int32_t PellandoEAT::SizeOf(std::uint16_t id) const try {
-    const auto& entries = datastore.GetDatastore();
+    const auto& entries = datastore_.GetDatastore();
     const auto entry = Find(entries, id);
     if (entry == entries.end() || std::next(entry) == entries.end()) {
         throw ResourceException("id " + lexical_cast<std::string>(id) + " doesn't exist", Here());
@@ -164,7 +166,7 @@ TRACED
 
 void PellandoEAT::Restore(Backup& before) {
     if (before) {
-        std::swap(datastore, *before);
+        std::swap(datastore_, *before);
     }
 }
 
@@ -188,7 +190,7 @@ void PellandoEAT::MoveSectionEnd(const Properties& set, std::uint16_t idOffset, 
         return;
     }
     const auto& [lastId, lastValue] = set.GetDatastore().back();
-    const auto& entries = datastore.GetDatastore();
+    const auto& entries = datastore_.GetDatastore();
     const auto last = Find(entries, WithOffset(lastId, idOffset));
     const auto behind = last == entries.end() ? last : std::next(last);
     if (behind != entries.end() && IsSectionEnd(behind->first)) {
@@ -199,14 +201,14 @@ void PellandoEAT::MoveSectionEnd(const Properties& set, std::uint16_t idOffset, 
 
 void PellandoEAT::MoveTo(std::uint16_t id, std::int64_t address, Backup& before) {
     if (!before) {
-        before = datastore;
+        before = datastore_;
     }
-    datastore.GetProperty(id).Assign(To32Bits(address));
+    datastore_.GetProperty(id).Assign(To32Bits(address));
 }
 
 bool PellandoEAT::Locates(const Properties& set, std::uint32_t start, std::uint16_t idOffset) const try {
     std::int64_t expected = start;
-    const auto& entries = datastore.GetDatastore();
+    const auto& entries = datastore_.GetDatastore();
     for (const auto& [id, value] : set.GetDatastore()) {
         const auto entry = Find(entries, WithOffset(id, idOffset));
         if (entry == entries.end() || std::next(entry) == entries.end() ||
@@ -227,9 +229,9 @@ void PellandoEAT::Dump(std::vector<std::uint8_t>::iterator first,
     if (static_cast<std::size_t>(last - first) < HeaderSize) {
         throw ResourceException("Configuration data dump target too small", Here());
     }
-    EndianConversion::ShortToByteArray(version, &*first + TableLayout::Version, true);
-    EndianConversion::ShortToByteArray(length, &*first + TableLayout::Length, true);
-    datastore.Dump(first + HeaderSize, last, false, true);
+    EndianConversion::ShortToByteArray(version_, &*first + TableLayout::Version, true);
+    EndianConversion::ShortToByteArray(length_, &*first + TableLayout::Length, true);
+    datastore_.Dump(first + HeaderSize, last, false, true);
 }
 TRACED
 
@@ -238,8 +240,8 @@ void PellandoEAT::InitializeEmtpyEAT() try {
     CreateSection(GetDefaultLogData(), EepromMap::LogCopy, EepromMap::EndOfLogCopy,
                   EepromMap::LogCopyIdOffset);
     CreateSection(GetDefaultCalibrationData(), EepromMap::Calibration, EepromMap::EndOfCalibration, 0);
-    version = TableLayout::KnownVersion;
-    length = static_cast<std::uint16_t>(datastore.SizeOf(false) + HeaderSize);
+    version_ = TableLayout::KnownVersion;
+    length_ = static_cast<std::uint16_t>(datastore_.SizeOf(false) + HeaderSize);
 }
 TRACED
 
@@ -247,11 +249,11 @@ void PellandoEAT::CreateSection(const Properties& defaults, std::uint32_t start,
                                 std::uint32_t idOffset) try {
     std::uint32_t address = start;
     for (const auto& [id, value] : defaults.GetDatastore()) {
-        datastore.SetProperty(static_cast<std::uint16_t>(id + idOffset),
-                              Property(static_cast<std::int32_t>(address)));
+        datastore_.SetProperty(static_cast<std::uint16_t>(id + idOffset),
+                               Property(static_cast<std::int32_t>(address)));
         address += static_cast<std::uint32_t>(value.SizeOf());
     }
-    datastore.SetProperty(sectionId, Property(static_cast<std::int32_t>(address)));
+    datastore_.SetProperty(sectionId, Property(static_cast<std::int32_t>(address)));
 }
 TRACED
 

@@ -76,8 +76,8 @@ class PellandoEAT final {
                        std::uint32_t idOffset);
 
     /// Identifiers and addresses (`TypeLong`) in table order.
-    const Properties& GetDatastore() const { return datastore; }
-    Properties& GetDatastore() { return datastore; }
+    const Properties& GetDatastore() const { return datastore_; }
+    Properties& GetDatastore() { return datastore_; }
 
     /// What the sections of a fresh EEPROM hold, in order; the same object with each call.
     static const Properties& GetDefaultCalibrationData();
@@ -92,9 +92,9 @@ class PellandoEAT final {
     void MoveTo(std::uint16_t id, std::int64_t address, Backup& before);
     void Restore(Backup& before);
 
-    std::uint16_t version = 0;
-    std::uint16_t length = 0;
-    Properties datastore;
+    std::uint16_t version_ = 0;
+    std::uint16_t length_ = 0;
+    Properties datastore_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -70,13 +70,13 @@ bool IsRequested(const Properties& set, std::uint16_t request) {
 }  // namespace
 
 PellandoEEPROM::PellandoEEPROM(const SmartPointer<PellandoFunctionality>& instrument) try
-    : functionality(instrument) {
-    Bytes first = Read(*functionality, 0, HalfSize);
-    const Bytes second = Read(*functionality, HalfSize, HalfSize);
+    : functionality_(instrument) {
+    Bytes first = Read(*functionality_, 0, HalfSize);
+    const Bytes second = Read(*functionality_, HalfSize, HalfSize);
     const Bytes image = Joined(std::move(first), second);
-    eat = SmartPointer<PellandoEAT>(new PellandoEAT(image.begin() + EepromMap::Table));
-    log = SmartPointer<PellandoLog>(new PellandoLog(*eat, image.begin()));
-    logArea = std::clamp<std::size_t>(log->SizeOf(), EepromMap::LogSize, EepromMap::LogArea);
+    eat_ = SmartPointer<PellandoEAT>(new PellandoEAT(image.begin() + EepromMap::Table));
+    log_ = SmartPointer<PellandoLog>(new PellandoLog(*eat_, image.begin()));
+    logArea_ = std::clamp<std::size_t>(log_->SizeOf(), EepromMap::LogSize, EepromMap::LogArea);
     SetupCalibrationData(image);
 }
 TRACED
@@ -91,8 +91,8 @@ PellandoEEPROM::~PellandoEEPROM() {
     } catch (...) {
     }
     try {
-        if (reportLostLog) {
-            reportLostLog(reason);
+        if (reportLostLog_) {
+            reportLostLog_(reason);
         }
     } catch (...) {
         // Nobody is left to tell.
@@ -100,14 +100,14 @@ PellandoEEPROM::~PellandoEEPROM() {
 }
 
 void PellandoEEPROM::SetupCalibrationData(const Bytes& image) try {
-    const SectionReader readSection(*eat, &ConfigurationDataConverter::IsCalibrationParameter);
-    calibration = readSection(image.data(), 0);
-    calibration.SetName(CalibrationName);
+    const SectionReader readSection(*eat_, &ConfigurationDataConverter::IsCalibrationParameter);
+    calibration_ = readSection(image.data(), 0);
+    calibration_.SetName(CalibrationName);
 }
 TRACED
 
 void PellandoEEPROM::ReportLostLog(LostLogHandler handler) {
-    reportLostLog = std::move(handler);
+    reportLostLog_ = std::move(handler);
 }
 
 bool PellandoEEPROM::IsEEPROMProperty(std::uint16_t id) {
@@ -116,14 +116,14 @@ bool PellandoEEPROM::IsEEPROMProperty(std::uint16_t id) {
            id == PropertyIds::DumpLogRequest;
 }
 
-PellandoLog& PellandoEEPROM::GetLog() try { return *log; }
+PellandoLog& PellandoEEPROM::GetLog() try { return *log_; }
 TRACED
 
 PellandoLog& PellandoEEPROM::GetLog(bool dumpIfRecommended) try {
-    if (dumpIfRecommended && log->IsDumpRecommended()) {
+    if (dumpIfRecommended && log_->IsDumpRecommended()) {
         DumpLog();
     }
-    return *log;
+    return *log_;
 }
 TRACED
 
@@ -133,11 +133,11 @@ TRACED
 Properties& PellandoEEPROM::Load(Properties& set) try {
     if (set.GetItemCount() == 0) {
         if (set.GetName() == CalibrationName) {
-            set = calibration;
+            set = calibration_;
         } else if (set.GetName() == "LogData") {
             set = GetLog().GetItems();
         } else if (set.GetName() == "EATData") {
-            set = eat->GetDatastore();
+            set = eat_->GetDatastore();
         }
         return set;
     }
@@ -181,7 +181,7 @@ const Property& PellandoEEPROM::GetProperty(std::uint16_t id) try {
         return GetLog().GetItem(id);
     }
     if (ConfigurationDataConverter::IsCalibrationParameter(id)) {
-        return calibration.GetProperty(id);
+        return calibration_.GetProperty(id);
     }
     throw ResourceException("unknown property id = " + lexical_cast<std::string>(id), Here());
 }
@@ -191,7 +191,7 @@ void PellandoEEPROM::SetProperty(std::uint16_t id, const Property& value) try {
     if (ConfigurationDataConverter::IsLogParameter(id)) {
         GetLog(true).SetItem(id, value);
     } else if (ConfigurationDataConverter::IsCalibrationParameter(id)) {
-        calibration.SetProperty(id, value);
+        calibration_.SetProperty(id, value);
     }
 }
 TRACED
@@ -202,68 +202,68 @@ void PellandoEEPROM::StoreBinary(std::uint16_t id, const Bytes& data) try {
             throw ResourceException("Wrong Tallimer size", Here());
         }
         const auto second = data.begin() + EepromMap::BinaryFirstSize;
-        functionality->WriteEEPROM(EepromMap::BinaryFirst, Bytes(data.begin(), second));
-        functionality->WriteEEPROM(EepromMap::BinarySecond, Bytes(second, data.end()));
+        functionality_->WriteEEPROM(EepromMap::BinaryFirst, Bytes(data.begin(), second));
+        functionality_->WriteEEPROM(EepromMap::BinarySecond, Bytes(second, data.end()));
     } else if (IsRawWord(id)) {
         const std::uint32_t address = AddressOfRawWord(id);
         if (address >= EepromMap::EndOfLogArea || data.size() > EepromMap::EndOfLogArea - address) {
             throw ResourceException(AccessDenied, Here());
         }
-        functionality->WriteEEPROM(address, data);
+        functionality_->WriteEEPROM(address, data);
     }
 }
 TRACED
 
 Bytes PellandoEEPROM::LoadBinary(std::uint16_t id) try {
     if (id == PropertyIds::BinaryBlock) {
-        Bytes first = Read(*functionality, EepromMap::BinaryFirst, EepromMap::BinaryFirstSize);
+        Bytes first = Read(*functionality_, EepromMap::BinaryFirst, EepromMap::BinaryFirstSize);
         return Joined(std::move(first),
-                      Read(*functionality, EepromMap::BinarySecond, EepromMap::BinarySecondSize));
+                      Read(*functionality_, EepromMap::BinarySecond, EepromMap::BinarySecondSize));
     }
     if (IsRawWord(id)) {
-        return Read(*functionality, AddressOfRawWord(id), EepromMap::RawWordSize);
+        return Read(*functionality_, AddressOfRawWord(id), EepromMap::RawWordSize);
     }
     return {};
 }
 TRACED
 
 Bytes PellandoEEPROM::Dump() try {
-    eat->EnsureConsistency(calibration);
-    eat->FitSection(calibration, 0);
+    eat_->EnsureConsistency(calibration_);
+    eat_->FitSection(calibration_, 0);
     PellandoLog& currentLog = GetLog(true);
     currentLog.UpdateChecksum();  // which decides the checksum item's size
-    eat->EnsureConsistency(currentLog);
+    eat_->EnsureConsistency(currentLog);
     const Properties& items = currentLog.GetItems();
-    eat->FitSection(items, 0);
-    FitSecondLog(*eat, items);
+    eat_->FitSection(items, 0);
+    FitSecondLog(*eat_, items);
     Bytes image(Protocol::EepromSize, UnusedByte);
     const auto at = [&image](std::ptrdiff_t address) { return image.begin() + address; };
     GetLog(true).Dump(at(EepromMap::MainLog), at(EepromMap::LogCopy));
     GetLog(true).Dump(at(EepromMap::LogCopy), at(EepromMap::EndOfLogArea));
-    eat->Dump(at(EepromMap::Table), at(EepromMap::Calibration));
-    calibration.Dump(at(EepromMap::Calibration), image.end(), true, true);
+    eat_->Dump(at(EepromMap::Table), at(EepromMap::Calibration));
+    calibration_.Dump(at(EepromMap::Calibration), image.end(), true, true);
     return image;
 }
 TRACED
 
 void PellandoEEPROM::Lock() try {
-    if (locked) {
+    if (locked_) {
         throw ResourceException("EEPROM already locked", Here());
     }
-    locked = true;
+    locked_ = true;
 }
 TRACED
 
 void PellandoEEPROM::Unlock() try {
-    if (!locked) {
+    if (!locked_) {
         throw ResourceException("EEPROM already unlocked", Here());
     }
-    locked = false;
+    locked_ = false;
 }
 TRACED
 
 void PellandoEEPROM::ThrowIfLocked() const try {
-    if (locked) {
+    if (locked_) {
         throw ResourceException(AccessDenied, Here());
     }
 }
@@ -276,14 +276,14 @@ void PellandoEEPROM::WriteThrough() try {
 TRACED
 
 void PellandoEEPROM::DumpLog() try {
-    log->UpdateChecksum();  // which decides the checksum item's size
-    if (log->SizeOf() > logArea) {
+    log_->UpdateChecksum();  // which decides the checksum item's size
+    if (log_->SizeOf() > logArea_) {
         throw ResourceException("Configuration data dump target too small", Here());
     }
-    Bytes bytes(log->SizeOf());
-    log->Dump(bytes.begin(), bytes.end());
-    functionality->WriteEEPROM(EepromMap::MainLog, bytes);
-    functionality->WriteEEPROM(EepromMap::LogCopy, bytes);
+    Bytes bytes(log_->SizeOf());
+    log_->Dump(bytes.begin(), bytes.end());
+    functionality_->WriteEEPROM(EepromMap::MainLog, bytes);
+    functionality_->WriteEEPROM(EepromMap::LogCopy, bytes);
 }
 TRACED
 

@@ -97,13 +97,13 @@ class PellandoEEPROM {
     static bool IsEEPROMProperty(std::uint16_t id);
 
   private:
-    Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionality> functionality;
-    bool locked = true;
-    Varnholt::Utilities::Tools::SmartPointer<PellandoLog> log;
-    Varnholt::Utilities::Tools::SmartPointer<PellandoEAT> eat;
-    std::size_t logArea = 0;  ///< bytes that the log may take in the instrument
-    Properties calibration;
-    LostLogHandler reportLostLog;
+    Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionality> functionality_;
+    bool locked_ = true;
+    Varnholt::Utilities::Tools::SmartPointer<PellandoLog> log_;
+    Varnholt::Utilities::Tools::SmartPointer<PellandoEAT> eat_;
+    std::size_t logArea_ = 0;  ///< bytes that the log may take in the instrument
+    Properties calibration_;
+    LostLogHandler reportLostLog_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -41,61 +41,61 @@ std::uint16_t CheckedLength(std::size_t length) {
 }  // namespace
 
 PellandoFunctionality::PellandoFunctionality(Generic::EventListener* listener, std::uint32_t deviceIndex) try
-    : implementation(PellandoFunctionalityByte::Instance(listener, deviceIndex)) {
+    : implementation_(PellandoFunctionalityByte::Instance(listener, deviceIndex)) {
     Reset(Protocol::OpeningResetCode);
 }
 TRACED
 
 PellandoFunctionality::PellandoFunctionality(
     const Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionalityByte>& transport) try
-    : implementation(transport) {
+    : implementation_(transport) {
     Reset(Protocol::OpeningResetCode);
 }
 TRACED
 
 void PellandoFunctionality::removeListener(Generic::EventListener* listener) try {
-    implementation->RemoveListener(listener);
+    implementation_->RemoveListener(listener);
 }
 TRACED
 
 void PellandoFunctionality::SetScanReceiver(ScanReceiver* receiver) try {
-    implementation->SetScanReceiver(receiver);
+    implementation_->SetScanReceiver(receiver);
 }
 TRACED
 
 void PellandoFunctionality::SetDataStageObserver(DataStageObserver* observer) try {
-    implementation->SetDataStageObserver(observer);
+    implementation_->SetDataStageObserver(observer);
 }
 TRACED
 
 void PellandoFunctionality::MeasureRequest(std::uint8_t* buffer, std::uint32_t length,
                                            std::uint32_t timeoutSeconds) try {
-    implementation->MeasureRequest(buffer, length, timeoutSeconds);
+    implementation_->MeasureRequest(buffer, length, timeoutSeconds);
 }
 TRACED
 
 void PellandoFunctionality::SetMeasureParameters(std::uint16_t p1, std::uint16_t p2, std::uint16_t p3,
                                                  std::uint8_t p4) try {
-    implementation->SetMeasureParameters(ToBytes(p1), ToBytes(p2), ToBytes(p3), p4);
+    implementation_->SetMeasureParameters(ToBytes(p1), ToBytes(p2), ToBytes(p3), p4);
 }
 TRACED
 
 void PellandoFunctionality::GetMeasureParameters(std::uint16_t& p1, std::uint16_t& p2, std::uint16_t& p3,
                                                  std::uint8_t& p4, std::uint8_t& p5) try {
     Bytes2 bytes1{}, bytes2{}, bytes3{};
-    implementation->GetMeasureParameters(bytes1, bytes2, bytes3, p4, p5);
+    implementation_->GetMeasureParameters(bytes1, bytes2, bytes3, p4, p5);
     FromBytes(bytes1, p1);
     FromBytes(bytes2, p2);
     FromBytes(bytes3, p3);
 }
 TRACED
 
-void PellandoFunctionality::SetMeasureMode(std::uint8_t mode) try { implementation->SetMeasureMode(mode); }
+void PellandoFunctionality::SetMeasureMode(std::uint8_t mode) try { implementation_->SetMeasureMode(mode); }
 TRACED
 
 void PellandoFunctionality::GetMeasureMode(std::uint8_t& m1, std::uint8_t& m2, std::uint8_t& m3,
                                            std::uint8_t& m4, std::uint8_t& m5, std::uint8_t& m6) try {
-    implementation->GetMeasureMode(m1, m2, m3, m4, m5, m6);
+    implementation_->GetMeasureMode(m1, m2, m3, m4, m5, m6);
 }
 TRACED
 
@@ -103,8 +103,8 @@ void PellandoFunctionality::WriteEEPROM(std::uint32_t address, const std::vector
     for (std::size_t offset = 0; offset < data.size(); offset += Protocol::EepromWritePiece) {
         const auto length = static_cast<std::uint16_t>(
             std::min<std::size_t>(data.size() - offset, Protocol::EepromWritePiece));
-        implementation->WriteEEPROM(ToBytes(address + static_cast<std::uint32_t>(offset)), ToBytes(length),
-                                    data.data() + offset, length);
+        implementation_->WriteEEPROM(ToBytes(address + static_cast<std::uint32_t>(offset)), ToBytes(length),
+                                     data.data() + offset, length);
     }
 }
 TRACED
@@ -116,7 +116,7 @@ void PellandoFunctionality::ReadEEPROM(std::uint32_t address, std::vector<std::u
     const std::uint16_t length = CheckedLength(padded);
     data.resize(padded);
     try {
-        implementation->ReadEEPROM(ToBytes(address), ToBytes(length), data.data(), length);
+        implementation_->ReadEEPROM(ToBytes(address), ToBytes(length), data.data(), length);
     } catch (...) {
         data.resize(wanted);
         throw;
@@ -126,13 +126,13 @@ void PellandoFunctionality::ReadEEPROM(std::uint32_t address, std::vector<std::u
 TRACED
 
 void PellandoFunctionality::WriteCPLD(std::uint16_t c1, std::uint16_t c2, std::uint16_t c3) try {
-    implementation->WriteCPLD(ToBytes(c1), ToBytes(c2), ToBytes(c3));
+    implementation_->WriteCPLD(ToBytes(c1), ToBytes(c2), ToBytes(c3));
 }
 TRACED
 
 void PellandoFunctionality::ReadCPLD(std::uint16_t& value) try {
     Bytes2 bytes{};
-    implementation->ReadCPLD(bytes);
+    implementation_->ReadCPLD(bytes);
     FromBytes(bytes, value);
 }
 TRACED
@@ -141,10 +141,10 @@ void PellandoFunctionality::DownloadFirmware(std::uint16_t address, const std::v
                                              bool toEEPROM) try {
     const std::uint16_t length = CheckedLength(image.size());
     if (toEEPROM) {
-        implementation->DownloadEEPROMFirmware(ToBytes(std::uint32_t{address}), ToBytes(length), image.data(),
-                                               length);
+        implementation_->DownloadEEPROMFirmware(ToBytes(std::uint32_t{address}), ToBytes(length),
+                                                image.data(), length);
     } else {
-        implementation->DownloadRAMFirmware(address, image.data(), length);
+        implementation_->DownloadRAMFirmware(address, image.data(), length);
     }
 }
 TRACED
@@ -152,7 +152,7 @@ TRACED
 void PellandoFunctionality::GetMISC(std::uint8_t& m1, std::uint16_t& m2, std::uint8_t& m3, std::uint16_t& m4,
                                     std::uint16_t& m5) try {
     Bytes2 bytes2{}, bytes4{}, bytes5{};
-    implementation->GetMISC(m1, bytes2, m3, bytes4, bytes5);
+    implementation_->GetMISC(m1, bytes2, m3, bytes4, bytes5);
     FromBytes(bytes2, m2);
     FromBytes(bytes4, m4);
     FromBytes(bytes5, m5);
@@ -160,21 +160,21 @@ void PellandoFunctionality::GetMISC(std::uint8_t& m1, std::uint16_t& m2, std::ui
 TRACED
 
 void PellandoFunctionality::GetDeviceIdentifier(std::string& identifier) try {
-    implementation->GetDeviceIdentifier(identifier);
+    implementation_->GetDeviceIdentifier(identifier);
 }
 TRACED
 
-void PellandoFunctionality::Reset(std::uint16_t code) try { implementation->Reset(ToBytes(code)); }
+void PellandoFunctionality::Reset(std::uint16_t code) try { implementation_->Reset(ToBytes(code)); }
 TRACED
 
 void PellandoFunctionality::StartScan(std::uint32_t recordSize, std::uint32_t timeoutSeconds,
                                       std::uint32_t total) try {
-    implementation->StartScan(recordSize, timeoutSeconds, total);
+    implementation_->StartScan(recordSize, timeoutSeconds, total);
 }
 TRACED
 
 void PellandoFunctionality::GetScanData(std::uint8_t* buffer, std::uint32_t& size) try {
-    implementation->GetScanData(buffer, &size);
+    implementation_->GetScanData(buffer, &size);
 }
 TRACED
 

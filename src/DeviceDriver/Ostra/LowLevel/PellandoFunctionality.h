@@ -62,7 +62,7 @@ class PellandoFunctionality final {
     void GetScanData(std::uint8_t* buffer, std::uint32_t& size);
 
   private:
-    Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionalityByte> implementation;
+    Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionalityByte> implementation_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -30,8 +30,8 @@ class PellandoFunctionalityByte {
     /// receiver the data of a scan wait for `GetScanData`. With one nothing is kept; what a transfer brought
     /// that then failed is handed over too, before the failure leaves `StartScan`; each transfer of the scan
     /// gets the time-out plus 3000 ms on either transport; and an open-ended scan may be of any length.
-    void SetScanReceiver(ScanReceiver* receiver) { scanReceiver = receiver; }
-    void SetDataStageObserver(DataStageObserver* observer) { dataStageObserver = observer; }
+    void SetScanReceiver(ScanReceiver* receiver) { scanReceiver_ = receiver; }
+    void SetDataStageObserver(DataStageObserver* observer) { dataStageObserver_ = observer; }
 
     /// No message reaches any listener once this has returned.
     virtual void RemoveListener(Generic::EventListener* listener) = 0;
@@ -79,16 +79,16 @@ class PellandoFunctionalityByte {
         Generic::EventListener* listener, std::uint32_t deviceIndex, Transport transport);
 
   protected:
-    ScanReceiver* Receiver() const { return scanReceiver; }
+    ScanReceiver* Receiver() const { return scanReceiver_; }
     void DataStageEnded(std::uint32_t asked, std::uint32_t moved) const {
-        if (dataStageObserver != nullptr) {
-            dataStageObserver->DataStageEnded(asked, moved);
+        if (dataStageObserver_ != nullptr) {
+            dataStageObserver_->DataStageEnded(asked, moved);
         }
     }
 
   private:
-    ScanReceiver* scanReceiver = nullptr;
-    DataStageObserver* dataStageObserver = nullptr;
+    ScanReceiver* scanReceiver_ = nullptr;
+    DataStageObserver* dataStageObserver_ = nullptr;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -21,7 +21,7 @@ constexpr std::int32_t ChangesBeforeDump = 20;
 }  // namespace
 
 PellandoLog::PellandoLog(const PellandoEAT& table, std::vector<std::uint8_t>::const_iterator image) try
-    : items("MainLogData") {
+    : items_("MainLogData") {
     ParseBuffer(table, &*image, 0);
     if (!HasValidChecksum()) {
         RestoreLogData(table, &*image);
@@ -33,7 +33,7 @@ TRACED
 void PellandoLog::ParseBuffer(const PellandoEAT& table, const std::uint8_t* image,
                               std::uint16_t idOffset) try {
     const SectionReader readSection(table, &ConfigurationDataConverter::IsLogParameter);
-    items = readSection(image, idOffset);
+    items_ = readSection(image, idOffset);
 }
 TRACED
 
@@ -42,7 +42,7 @@ void PellandoLog::RestoreLogData(const PellandoEAT& table, const std::uint8_t* i
     if (HasValidChecksum()) {
         return;
     }
-    for (auto& [id, value] : items.GetDatastore()) {
+    for (auto& [id, value] : items_.GetDatastore()) {
         value = ConfigurationDataConverter::GetDefaultProperty(id);
     }
 }
@@ -50,7 +50,7 @@ TRACED
 
 std::uint32_t PellandoLog::CalculateChecksum() const try {
     std::uint32_t sum = 0;
-    for (const auto& [id, value] : items.GetDatastore()) {
+    for (const auto& [id, value] : items_.GetDatastore()) {
         if (id == LogChecksum) {
             continue;
         }
@@ -67,28 +67,28 @@ std::uint32_t PellandoLog::CalculateChecksum() const try {
 TRACED
 
 bool PellandoLog::HasValidChecksum() const try {
-    const Property& stored = items.GetProperty(LogChecksum);
+    const Property& stored = items_.GetProperty(LogChecksum);
     return !stored.AsLongVector().empty() &&
            static_cast<std::uint32_t>(stored.AsLong()) == CalculateChecksum();
 }
 TRACED
 
 void PellandoLog::UpdateChecksum() try {
-    items.GetProperty(LogChecksum).Assign(static_cast<std::int32_t>(CalculateChecksum()));
+    items_.GetProperty(LogChecksum).Assign(static_cast<std::int32_t>(CalculateChecksum()));
 }
 TRACED
 
-const Property& PellandoLog::GetItem(std::uint16_t id) const try { return items.GetProperty(id); }
+const Property& PellandoLog::GetItem(std::uint16_t id) const try { return items_.GetProperty(id); }
 TRACED
 
 void PellandoLog::SetItem(std::uint16_t id, const Property& value) try {
-    pendingItems.remove(id);
-    items.SetProperty(id, value);
-    if (pendingItems.empty()) {
-        changeCount = ChangesBeforeDump;
+    pendingItems_.remove(id);
+    items_.SetProperty(id, value);
+    if (pendingItems_.empty()) {
+        changeCount_ = ChangesBeforeDump;
         RefillPendingItems();
     }
-    ++changeCount;
+    ++changeCount_;
 }
 TRACED
 
@@ -104,23 +104,23 @@ void PellandoLog::Increment(std::uint16_t id, float step) try {
 TRACED
 
 bool PellandoLog::IsDumpRecommended() const {
-    return changeCount >= ChangesBeforeDump;
+    return changeCount_ >= ChangesBeforeDump;
 }
 
 std::size_t PellandoLog::SizeOf() const {
-    return items.SizeOf(true);
+    return items_.SizeOf(true);
 }
 
 void PellandoLog::Dump(std::vector<std::uint8_t>::iterator first,
                        std::vector<std::uint8_t>::iterator last) try {
-    changeCount = 0;
+    changeCount_ = 0;
     UpdateChecksum();
-    items.Dump(first, last, true, true);
+    items_.Dump(first, last, true, true);
 }
 TRACED
 
 void PellandoLog::RefillPendingItems() {
-    pendingItems = {10010, 10011, 10012, 10013, 10020, 10021};
+    pendingItems_ = {10010, 10011, 10012, 10013, 10020, 10021};
 }
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

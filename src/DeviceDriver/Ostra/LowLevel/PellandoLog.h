@@ -44,7 +44,7 @@ class PellandoLog final {
     /// The integer wraps.
     void Increment(std::uint16_t id, std::int32_t step);
     void Increment(std::uint16_t id, float step);
-    const Properties& GetItems() const { return items; }
+    const Properties& GetItems() const { return items_; }
 
     /// After 20 changes, or when each of the items 10010 to 10013, 10020 and 10021 has been set since that
     /// last happened; until the next `Dump`.
@@ -59,9 +59,9 @@ class PellandoLog final {
   private:
     void RefillPendingItems();
 
-    Properties items;
-    std::int32_t changeCount = 0;
-    std::list<std::uint16_t> pendingItems;  ///< watched items not set since the list was last refilled
+    Properties items_;
+    std::int32_t changeCount_ = 0;
+    std::list<std::uint16_t> pendingItems_;  ///< watched items not set since the list was last refilled
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

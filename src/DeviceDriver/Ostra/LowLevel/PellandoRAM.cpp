@@ -89,7 +89,7 @@ Properties MakePhysicalConditions() {
 }  // namespace
 
 PellandoRAM::PellandoRAM(const SmartPointer<PellandoFunctionality>& instrument)
-    : functionality(instrument), tickSeconds(InitialTickSeconds), coarseFactor(InitialCoarseFactor) {}
+    : functionality_(instrument), tickSeconds_(InitialTickSeconds), coarseFactor_(InitialCoarseFactor) {}
 
 const Properties& PellandoRAM::GetDefaultPhysicalConditons() try {
     static const Properties physicalConditions = MakePhysicalConditions();
@@ -134,7 +134,7 @@ TRACED
 void PellandoRAM::LoadMiscParameters(Properties& set) try {
     std::uint8_t m1 = 0, m3 = 0;
     std::uint16_t m2 = 0, m4 = 0, m5 = 0;
-    functionality->GetMISC(m1, m2, m3, m4, m5);
+    functionality_->GetMISC(m1, m2, m3, m4, m5);
     set.SetProperty(Misc1, Long(m1));
     set.SetProperty(Misc2, Long(m2));
     set.SetProperty(Misc3, Long(m3));
@@ -149,11 +149,11 @@ TRACED
 void PellandoRAM::LoadMeasureParameters(Properties& set) try {
     std::uint16_t p1 = 0, p2 = 0, p3 = 0;
     std::uint8_t p4 = 0, p5 = 0;
-    functionality->GetMeasureParameters(p1, p2, p3, p4, p5);
+    functionality_->GetMeasureParameters(p1, p2, p3, p4, p5);
     // The products are exact in double precision, so that each time is rounded once.
-    const double tick = tickSeconds;
+    const double tick = tickSeconds_;
     set.SetProperty(IntegrationTime, Property(static_cast<float>(tick * p1)));
-    set.SetProperty(SecondTime, Property(static_cast<float>(tick * (std::uint32_t{p2} * coarseFactor))));
+    set.SetProperty(SecondTime, Property(static_cast<float>(tick * (std::uint32_t{p2} * coarseFactor_))));
     set.SetProperty(ThirdParameter, Long(p3));
     set.SetProperty(FifthParameter, Long(p5));
     for (const Flag& flag : Flags) {
@@ -164,9 +164,9 @@ TRACED
 
 void PellandoRAM::StoreMeasureParameters(Properties& set) try {
     SwitchToPerfectMode(set);
-    const double tick = tickSeconds;
+    const double tick = tickSeconds_;
     const std::uint16_t p1 = Count(set.GetProperty(IntegrationTime).AsFloat() / tick);
-    const std::uint16_t p2 = Count(set.GetProperty(SecondTime).AsFloat() / tick / coarseFactor);
+    const std::uint16_t p2 = Count(set.GetProperty(SecondTime).AsFloat() / tick / coarseFactor_);
     auto p3 =
         static_cast<std::uint16_t>(std::min(set.GetProperty(ThirdParameter).AsLong(), LargestThirdParameter));
     std::uint8_t flags = 0;
@@ -181,7 +181,7 @@ void PellandoRAM::StoreMeasureParameters(Properties& set) try {
             flags = static_cast<std::uint8_t>(flags | flag.bit);
         }
     }
-    functionality->SetMeasureParameters(p1, p2, p3, flags);
+    functionality_->SetMeasureParameters(p1, p2, p3, flags);
 }
 TRACED
 
@@ -192,33 +192,33 @@ std::uint32_t PellandoRAM::SearchedMicroseconds(float seconds) {
 }
 
 void PellandoRAM::SwitchToPerfectMode(const Properties& set) try {
-    tickSeconds = InitialTickSeconds;
-    coarseFactor = InitialCoarseFactor;
+    tickSeconds_ = InitialTickSeconds;
+    coarseFactor_ = InitialCoarseFactor;
     if (set.GetProperty(Misc2).AsLong() < FirstMisc2WithModes) {
-        perfectMode = false;
+        perfectMode_ = false;
         return;
     }
     const std::uint32_t microseconds = SearchedMicroseconds(set.GetProperty(IntegrationTime).AsFloat());
     std::uint8_t mode = 0;
     for (int round = 0; round < MostModes; ++round) {
         mode = static_cast<std::uint8_t>(mode + 1);
-        functionality->SetMeasureMode(mode);
+        functionality_->SetMeasureMode(mode);
         std::uint8_t modeCount = 0, unused = 0, factor = 0, unitMicroseconds = 0, modeFlags = 0;
-        functionality->GetMeasureMode(modeCount, mode, unused, factor, unitMicroseconds, modeFlags);
+        functionality_->GetMeasureMode(modeCount, mode, unused, factor, unitMicroseconds, modeFlags);
         if (unitMicroseconds * LongestCount <= microseconds) {
             throw ResourceException("Integration time too high", Here());
         }
         if (std::uint32_t{factor} * unitMicroseconds <= microseconds) {
-            perfectMode = (modeFlags & 1U) != 0;
-            tickSeconds = static_cast<float>(unitMicroseconds / MicrosecondsPerSecond);
-            coarseFactor = factor;
+            perfectMode_ = (modeFlags & 1U) != 0;
+            tickSeconds_ = static_cast<float>(unitMicroseconds / MicrosecondsPerSecond);
+            coarseFactor_ = factor;
             return;
         }
         if (mode >= modeCount) {
             break;
         }
     }
-    perfectMode = false;
+    perfectMode_ = false;
     throw ResourceException("Integration time too low", Here());
 }
 TRACED

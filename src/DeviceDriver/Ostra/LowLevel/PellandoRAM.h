@@ -36,7 +36,7 @@ class PellandoRAM {
     /// "id N doesn't exist" for the first that is missing.
     virtual void Store(Properties& set);
     /// What the instrument said of the mode last chosen; false before the first store.
-    virtual bool IsInPerfectMode() { return perfectMode; }
+    virtual bool IsInPerfectMode() { return perfectMode_; }
 
     void LoadMiscParameters(Properties& set);
     void LoadMeasureParameters(Properties& set);
@@ -57,10 +57,10 @@ class PellandoRAM {
     static const Properties& GetDefaultPhysicalConditons();
 
   private:
-    Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionality> functionality;
-    bool perfectMode = false;
-    float tickSeconds;
-    std::uint16_t coarseFactor;  ///< time units in one unit of the second measurement time
+    Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionality> functionality_;
+    bool perfectMode_ = false;
+    float tickSeconds_;
+    std::uint16_t coarseFactor_;  ///< time units in one unit of the second measurement time
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -28,14 +28,14 @@ bool LiesInTheImage(std::int32_t address, std::int32_t size) {
 
 Properties SectionReader::operator()(const std::uint8_t* image, std::uint16_t idOffset) const try {
     Properties section;
-    for (const auto& entry : table.GetDatastore().GetDatastore()) {
+    for (const auto& entry : table_.GetDatastore().GetDatastore()) {
         const std::uint16_t id = entry.first;
-        if (!isPicked(id)) {
+        if (!isPicked_(id)) {
             continue;
         }
         const auto tableId = static_cast<std::uint16_t>(id + idOffset);
-        const std::int32_t address = table.AddressOf(tableId);
-        const std::int32_t size = table.SizeOf(tableId);
+        const std::int32_t address = table_.AddressOf(tableId);
+        const std::int32_t size = table_.SizeOf(tableId);
         if (!LiesInTheImage(address, size)) {
             throw DataException(PellandoEAT::CorruptTable, Here());
         }

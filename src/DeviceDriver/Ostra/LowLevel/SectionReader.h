@@ -16,7 +16,7 @@ class SectionReader final {
 
     /// The table is not owned and must outlive the reader.
     SectionReader(const PellandoEAT& allocationTable, Predicate picks)
-        : table(allocationTable), isPicked(picks) {}
+        : table_(allocationTable), isPicked_(picks) {}
 
     /// `image` points to byte 0 of an image of 8192 bytes. Each value is read at the address of its
     /// identifier plus `idOffset` and filed under its identifier. The table says how many bytes that is,
@@ -29,8 +29,8 @@ class SectionReader final {
     Generic::Configuration::Properties operator()(const std::uint8_t* image, std::uint16_t idOffset) const;
 
   private:
-    const PellandoEAT& table;
-    const Predicate isPicked;
+    const PellandoEAT& table_;
+    const Predicate isPicked_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

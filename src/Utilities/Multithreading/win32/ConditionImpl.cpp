@@ -35,36 +35,36 @@ class ConditionImpl final : public Condition::Impl {
     /// One waiter less; true when it was the last one that a broadcast waits for.
     bool LeaveWaiters();
 
-    std::unique_ptr<ConditionState> state;
-    Mutex* const mutex;
+    std::unique_ptr<ConditionState> state_;
+    Mutex* const mutex_;
 };
 
-ConditionImpl::ConditionImpl(Mutex& mutexOfCondition) try : mutex(&mutexOfCondition) {
+ConditionImpl::ConditionImpl(Mutex& mutexOfCondition) try : mutex_(&mutexOfCondition) {
     try {
-        state = std::make_unique<ConditionState>();
+        state_ = std::make_unique<ConditionState>();
     } catch (const std::bad_alloc&) {
         throw ResourceException("ConditionImpl::ConditionImpl() can't allocate!", Here());
     }
-    if (!state->semaphore || !state->waitersDone) {
+    if (!state_->semaphore || !state_->waitersDone) {
         throw ResourceException("ConditionImpl::ConditionImpl() can't create!", Here());
     }
 }
 TRACED
 
 bool ConditionImpl::LeaveWaiters() {
-    const Platform::CriticalSection::Holder hold(state->waitersCountLock);
-    --state->waitersCount;
-    return state->wasBroadcast && state->waitersCount == 0;
+    const Platform::CriticalSection::Holder hold(state_->waitersCountLock);
+    --state_->waitersCount;
+    return state_->wasBroadcast && state_->waitersCount == 0;
 }
 
 void ConditionImpl::signal() try {
     std::int32_t waiters = 0;
     {
-        const Platform::CriticalSection::Holder hold(state->waitersCountLock);
-        waiters = state->waitersCount;
+        const Platform::CriticalSection::Holder hold(state_->waitersCountLock);
+        waiters = state_->waitersCount;
     }
-    if (waiters > 0 && !Platform::ReleaseSemaphore(state->semaphore.Get(), 1)) {
-        mutex->Unlock();
+    if (waiters > 0 && !Platform::ReleaseSemaphore(state_->semaphore.Get(), 1)) {
+        mutex_->Unlock();
         throw ResourceException("Condition::signal() invalid condition!", Here());
     }
 }
@@ -74,27 +74,27 @@ void ConditionImpl::broadcast() try {
     bool released = false;
     {
         // Held over the release, so that the waiters counted are the ones that are let go.
-        const Platform::CriticalSection::Holder hold(state->waitersCountLock);
-        if (state->waitersCount <= 0) {
+        const Platform::CriticalSection::Holder hold(state_->waitersCountLock);
+        if (state_->waitersCount <= 0) {
             return;
         }
-        if (!state->wasBroadcast) {
-            Platform::Wait(state->waitersDone.Get(), 0);  // takes away what a failed waiter has left there
+        if (!state_->wasBroadcast) {
+            Platform::Wait(state_->waitersDone.Get(), 0);  // takes away what a failed waiter has left there
         }
-        released = Platform::ReleaseSemaphore(state->semaphore.Get(), state->waitersCount);
-        state->wasBroadcast = released;
+        released = Platform::ReleaseSemaphore(state_->semaphore.Get(), state_->waitersCount);
+        state_->wasBroadcast = released;
     }
     if (!released) {
-        mutex->Unlock();
+        mutex_->Unlock();
         throw ResourceException("Condition::broadcast() unable to release semaphore!", Here());
     }
-    const WaitResult done = Platform::Wait(state->waitersDone.Get(), Platform::Infinite);
+    const WaitResult done = Platform::Wait(state_->waitersDone.Get(), Platform::Infinite);
     {
-        const Platform::CriticalSection::Holder hold(state->waitersCountLock);
-        state->wasBroadcast = false;
+        const Platform::CriticalSection::Holder hold(state_->waitersCountLock);
+        state_->wasBroadcast = false;
     }
     if (done != WaitResult::Signalled) {
-        mutex->Unlock();
+        mutex_->Unlock();
         throw ResourceException("Condition::broadcast() invalid event!", Here());
     }
 }
@@ -102,27 +102,27 @@ TRACED
 
 bool ConditionImpl::Wait(std::int32_t) try {
     {
-        const Platform::CriticalSection::Holder hold(state->waitersCountLock);
-        ++state->waitersCount;
+        const Platform::CriticalSection::Holder hold(state_->waitersCountLock);
+        ++state_->waitersCount;
     }
-    const Platform::Handle mutexHandle = mutex->impl->GetHandle();
-    if (Platform::SignalAndWait(mutexHandle, state->semaphore.Get(), Platform::Infinite) !=
+    const Platform::Handle mutexHandle = mutex_->impl_->GetHandle();
+    if (Platform::SignalAndWait(mutexHandle, state_->semaphore.Get(), Platform::Infinite) !=
         WaitResult::Signalled) {
         // A waiter that was counted and does not wait would keep every later broadcast waiting.
         if (LeaveWaiters()) {
-            Platform::SignalEvent(state->waitersDone.Get());
+            Platform::SignalEvent(state_->waitersDone.Get());
         }
         Platform::ReleaseMutex(mutexHandle);
         throw ResourceException("Condition::Wait() invalid Mutex! (must be a real mutex)", Here());
     }
     const bool isLast = LeaveWaiters();
     const WaitResult reacquired =
-        isLast ? Platform::SignalAndWait(state->waitersDone.Get(), mutexHandle, Platform::Infinite)
+        isLast ? Platform::SignalAndWait(state_->waitersDone.Get(), mutexHandle, Platform::Infinite)
                : Platform::Wait(mutexHandle, Platform::Infinite);
     if (reacquired != WaitResult::Signalled) {
         if (isLast) {
             // Nobody can tell whether that came as far as the signal, without which a broadcast never ends.
-            Platform::SignalEvent(state->waitersDone.Get());
+            Platform::SignalEvent(state_->waitersDone.Get());
         }
         Platform::ReleaseMutex(mutexHandle);
         throw ResourceException("Condition::Wait() invalid mutex! (must be a real mutex)", Here());

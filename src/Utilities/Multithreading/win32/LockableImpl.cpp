@@ -9,17 +9,17 @@ namespace {
 
 class CriticalSection final : public SynchronizationObject::Impl {
   public:
-    void Lock() override { section.Enter(); }
+    void Lock() override { section_.Enter(); }
     /// Untraced, so that the standard exception stays one.
     bool TryLock(int) override {
         throw std::runtime_error(
             "CriticalSection::TryLock: not yet implemented (TryEnterCriitcalSection not exists on  Win9X)");
     }
-    void Unlock() override { section.Leave(); }
-    Platform::Handle GetHandle() override { return &section; }
+    void Unlock() override { section_.Leave(); }
+    Platform::Handle GetHandle() override { return &section_; }
 
   private:
-    Platform::CriticalSection section;
+    Platform::CriticalSection section_;
 };
 
 class MutexImpl final : public Win32Lockable<SynchronizationObject::Impl> {

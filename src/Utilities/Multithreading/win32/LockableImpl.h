@@ -17,21 +17,21 @@ class Win32Lockable : public T {
     /// Takes ownership of `newHandle`; `NoHandle` is refused with `InvalidArgumentException`.
     Win32Lockable(Platform::Handle newHandle, const std::string& objectName);
 
-    void Lock() override { Platform::Wait(handle.Get(), Platform::Infinite); }
+    void Lock() override { Platform::Wait(handle_.Get(), Platform::Infinite); }
     /// Throws `InvalidArgumentException` when the previous owner of a mutex ended without releasing it. The
     /// mutex is then free again: a caller that is told of a failure does not unlock.
     bool TryLock(int timeout) override;
-    Platform::Handle GetHandle() override { return handle.Get(); }
+    Platform::Handle GetHandle() override { return handle_.Get(); }
 
   private:
-    Platform::OwnedHandle handle;
-    std::string name;
+    Platform::OwnedHandle handle_;
+    std::string name_;
 };
 
 template <class T>
 Win32Lockable<T>::Win32Lockable(Platform::Handle newHandle, const std::string& objectName) try
-    : handle(newHandle), name(objectName) {
-    if (!handle) {
+    : handle_(newHandle), name_(objectName) {
+    if (!handle_) {
         throw Exceptions::InvalidArgumentException("handle is NULL", Exceptions::Here());
     }
 }
@@ -40,7 +40,7 @@ TRACED
 template <class T>
 bool Win32Lockable<T>::TryLock(int timeout) try {
     const std::uint32_t limit = timeout < 0 ? Platform::Infinite : static_cast<std::uint32_t>(timeout);
-    switch (Platform::Wait(handle.Get(), limit)) {
+    switch (Platform::Wait(handle_.Get(), limit)) {
         case Platform::WaitResult::Signalled:
             return true;
         case Platform::WaitResult::TimedOut:

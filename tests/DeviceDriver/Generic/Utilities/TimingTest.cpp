@@ -20,11 +20,11 @@ ActualTime At(std::int32_t seconds, std::uint16_t milliseconds) {
 class TimingAt final : public Timing_PC {
   public:
     using Timing_PC::operator=;
-    explicit TimingAt(const ActualTime& fixed) : now(fixed) {}
-    ActualTime GetActualTime() override { return now; }
+    explicit TimingAt(const ActualTime& fixed) : now_(fixed) {}
+    ActualTime GetActualTime() override { return now_; }
 
   private:
-    const ActualTime now;
+    const ActualTime now_;
 };
 
 TEST(Timing, DifferenceInSeconds) {

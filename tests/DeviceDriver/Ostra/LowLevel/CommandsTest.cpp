@@ -25,7 +25,7 @@ class Commands : public DriverTest, public testing::WithParamInterface<Transport
     Commands() { Override64BitHost(!IsNative()); }
     ~Commands() override {
         Override64BitHost(std::nullopt);
-        EXPECT_EQ(driver.OpenFiles(), 0U);
+        EXPECT_EQ(driver_.OpenFiles(), 0U);
     }
 
     static bool IsNative() { return GetParam() == Transport::Native; }
@@ -40,13 +40,13 @@ class Commands : public DriverTest, public testing::WithParamInterface<Transport
         } else {
             opened = std::make_unique<PellandoFunctionality_Win64>(nullptr, 0);
         }
-        WaitUntil([this] { return driver.Running(Interrupts()) == 1; });
-        driver.TakeTranscript();
+        WaitUntil([this] { return driver_.Running(Interrupts()) == 1; });
+        driver_.TakeTranscript();
         return opened;
     }
     /// Without the interrupt listener's reads.
     Lines TakeTransfers() {
-        Lines lines = driver.TakeTransfers();
+        Lines lines = driver_.TakeTransfers();
         std::erase_if(lines, [](const std::string& line) {
             return line.starts_with("read 84") || line.starts_with("cancel 84");
         });
@@ -140,14 +140,14 @@ TEST_P(Commands, OnTheWire) {
             instrument.reset();  // over this driver a command leaves bytes to the next one
             instrument = Open();
         }
-        driver.DropScript(0);
-        driver.Script(std::strstr(command.wire, "|in") ? In() : 0, {.data = command.Answer()});
-        const Stopwatch watch(clock);
+        driver_.DropScript(0);
+        driver_.Script(std::strstr(command.wire, "|in") ? In() : 0, {.data = command.Answer()});
+        const Stopwatch watch(clock_);
         EXPECT_EQ(command.run(*instrument), command.Answer());
         watch.ExpectBetween(1, 2);  // a request takes a pause of a millisecond
         EXPECT_EQ(TakeTransfers(), command.Transcript(IsNative()));
     }
-    driver.DropScript(0);
+    driver_.DropScript(0);
 }
 
 TEST_P(Commands, EndWithTheTransferThatFails) {
@@ -187,9 +187,9 @@ TEST_P(Commands, EndWithTheTransferThatFails) {
     for (const auto& row : cases) {
         SCOPED_TRACE(row.name);
         for (std::size_t i = 0; i < row.failing; ++i) {
-            driver.Script(row.place, {});
+            driver_.Script(row.place, {});
         }
-        driver.Script(row.place, {.code = stall, .after = 3});
+        driver_.Script(row.place, {.code = stall, .after = 3});
         ExpectThrow<IOException>(IsNative()
                                      ? row.failure.nativeText + ErrorSuffix(stall)
                                      : std::string("Error in UsbIo function: \"") + row.failure.usbIoName +
@@ -204,8 +204,8 @@ TEST_P(Commands, WaitTheirTimeForData) {
     std::array<std::uint8_t, 64> buffer{};
     const auto instrument = Open();
     const auto expectFailureAfter = [&](std::uint64_t milliseconds, const std::function<void()>& command) {
-        driver.TakeTranscript();
-        const Stopwatch watch(clock);
+        driver_.TakeTranscript();
+        const Stopwatch watch(clock_);
         ExpectThrow<IOException>(
             IsNative()
                 ? "read data failed" + ErrorSuffix(Errors::IoIncomplete)
@@ -213,7 +213,7 @@ TEST_P(Commands, WaitTheirTimeForData) {
                   "been timed out.",
             command);
         watch.Expect(1 + milliseconds);
-        EXPECT_EQ(driver.Running(In()), 0U);
+        EXPECT_EQ(driver_.Running(In()), 0U);
     };
     expectFailureAfter(2000 + 5000, [&] { instrument->MeasureRequest(buffer.data(), 64, 2); });
     expectFailureAfter(64 + 5000, [&] { instrument->ReadEEPROM({}, {}, buffer.data(), 64); });

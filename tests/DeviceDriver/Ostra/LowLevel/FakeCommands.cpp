@@ -31,33 +31,33 @@ std::uint16_t Number(const Bytes2& bytes) {
 
 class FakeCommands final : public PellandoFunctionalityByte {
   public:
-    explicit FakeCommands(FakeInstrument& fake) : instrument(fake) {}
+    explicit FakeCommands(FakeInstrument& fake) : instrument_(fake) {}
 
     void SetMeasureParameters(const Bytes2& p1, const Bytes2& p2, const Bytes2& p3,
                               std::uint8_t p4) override {
         Receive("SetMeasureParameters");
-        instrument.p1 = Number(p1);
-        instrument.p2 = Number(p2);
-        instrument.p3 = Number(p3);
-        instrument.p4 = p4;
+        instrument_.p1 = Number(p1);
+        instrument_.p2 = Number(p2);
+        instrument_.p3 = Number(p3);
+        instrument_.p4 = p4;
     }
     void GetMeasureParameters(Bytes2& p1, Bytes2& p2, Bytes2& p3, std::uint8_t& p4,
                               std::uint8_t& p5) override {
         Receive("GetMeasureParameters");
-        Protocol::StoreBig16(p1.data(), instrument.p1);
-        Protocol::StoreBig16(p2.data(), instrument.p2);
-        Protocol::StoreBig16(p3.data(), instrument.p3);
-        p4 = instrument.p4;
-        p5 = instrument.p5;
+        Protocol::StoreBig16(p1.data(), instrument_.p1);
+        Protocol::StoreBig16(p2.data(), instrument_.p2);
+        Protocol::StoreBig16(p3.data(), instrument_.p3);
+        p4 = instrument_.p4;
+        p5 = instrument_.p5;
     }
     void SetMeasureMode(std::uint8_t mode) override {
         Receive("SetMeasureMode", mode);
-        instrument.mode = mode;
+        instrument_.mode = mode;
     }
     void GetMeasureMode(std::uint8_t& m1, std::uint8_t& m2, std::uint8_t& m3, std::uint8_t& m4,
                         std::uint8_t& m5, std::uint8_t& m6) override {
         Receive("GetMeasureMode");
-        const auto answers = instrument.describeMode(instrument.mode);
+        const auto answers = instrument_.describeMode(instrument_.mode);
         m1 = answers[0];
         m2 = answers[1];
         m3 = answers[2];
@@ -70,31 +70,31 @@ class FakeCommands final : public PellandoFunctionalityByte {
         const std::uint32_t start = Protocol::LoadBig32(address.data());
         RefuseOutside(start, count, Number(length));
         Receive("WriteEEPROM", start, count);
-        std::copy_n(data, count, instrument.eeprom.begin() + static_cast<std::ptrdiff_t>(start));
+        std::copy_n(data, count, instrument_.eeprom.begin() + static_cast<std::ptrdiff_t>(start));
     }
     void ReadEEPROM(const Bytes4& address, const Bytes2& length, std::uint8_t* data,
                     std::uint32_t count) override {
         const std::uint32_t start = Protocol::LoadBig32(address.data());
         RefuseOutside(start, count, Number(length));
         Receive("ReadEEPROM", start, count);
-        std::copy_n(instrument.eeprom.begin() + static_cast<std::ptrdiff_t>(start), count, data);
+        std::copy_n(instrument_.eeprom.begin() + static_cast<std::ptrdiff_t>(start), count, data);
     }
     void GetMISC(std::uint8_t& m1, Bytes2& m2, std::uint8_t& m3, Bytes2& m4, Bytes2& m5) override {
         Receive("GetMISC");
-        m1 = instrument.misc1;
-        Protocol::StoreBig16(m2.data(), instrument.misc2);
-        m3 = instrument.misc3;
-        Protocol::StoreBig16(m4.data(), instrument.misc4);
-        Protocol::StoreBig16(m5.data(), instrument.misc5);
+        m1 = instrument_.misc1;
+        Protocol::StoreBig16(m2.data(), instrument_.misc2);
+        m3 = instrument_.misc3;
+        Protocol::StoreBig16(m4.data(), instrument_.misc4);
+        Protocol::StoreBig16(m5.data(), instrument_.misc5);
     }
     void Reset(const Bytes2& code) override { Receive("Reset", Number(code)); }
     void WriteCPLD(const Bytes2& c1, const Bytes2& c2, const Bytes2& c3) override {
         Receive("WriteCPLD");
-        instrument.cpld = {Number(c1), Number(c2), Number(c3)};
+        instrument_.cpld = {Number(c1), Number(c2), Number(c3)};
     }
     void ReadCPLD(Bytes2& value) override {
         Receive("ReadCPLD");
-        Protocol::StoreBig16(value.data(), instrument.cpld[0]);
+        Protocol::StoreBig16(value.data(), instrument_.cpld[0]);
     }
     void DownloadRAMFirmware(std::uint16_t address, const std::uint8_t*, std::uint32_t count) override {
         Receive("DownloadRAMFirmware", address, count);
@@ -106,10 +106,10 @@ class FakeCommands final : public PellandoFunctionalityByte {
     }
     void GetScanData(std::uint8_t* buffer, std::uint32_t* size) override {
         Receive("GetScanData", 0, *size);
-        *size = std::min(*size, static_cast<std::uint32_t>(instrument.scan.size()));
-        std::copy_n(instrument.scan.begin(), *size, buffer);
-        instrument.scan.erase(instrument.scan.begin(),
-                              instrument.scan.begin() + static_cast<std::ptrdiff_t>(*size));
+        *size = std::min(*size, static_cast<std::uint32_t>(instrument_.scan.size()));
+        std::copy_n(instrument_.scan.begin(), *size, buffer);
+        instrument_.scan.erase(instrument_.scan.begin(),
+                               instrument_.scan.begin() + static_cast<std::ptrdiff_t>(*size));
     }
 
     // What nobody asks it for.
@@ -121,18 +121,19 @@ class FakeCommands final : public PellandoFunctionalityByte {
 
   private:
     void Receive(const char* name, std::uint32_t address = 0, std::uint32_t size = 0) {
-        instrument.commands.push_back({name, address, size});
-        if (instrument.commands.size() - 1 == instrument.failingCommand) {
+        instrument_.commands.push_back({name, address, size});
+        if (instrument_.commands.size() - 1 == instrument_.failingCommand) {
             throw IOException("the fake fails", Here());
         }
     }
     void RefuseOutside(std::uint32_t start, std::uint32_t count, std::uint32_t length) const {
-        if (start > instrument.eeprom.size() || count > instrument.eeprom.size() - start || count != length) {
+        if (start > instrument_.eeprom.size() || count > instrument_.eeprom.size() - start ||
+            count != length) {
             throw std::logic_error("EEPROM transfer outside the EEPROM");
         }
     }
 
-    FakeInstrument& instrument;
+    FakeInstrument& instrument_;
 };
 
 }  // namespace

@@ -48,38 +48,38 @@ class InterruptListeners : public DriverTest {
   protected:
     static constexpr std::uint32_t Place = Transport::Place;
 
-    InterruptListeners() { EXPECT_EQ(pipe->Bind(0, Protocol::InterruptInEndpoint, nullptr, nullptr), 0U); }
+    InterruptListeners() { EXPECT_EQ(pipe_->Bind(0, Protocol::InterruptInEndpoint, nullptr, nullptr), 0U); }
     ~InterruptListeners() override { InstallCallFilter({}); }
 
     /// The answers to the reads that count.
     void Script(const std::vector<Answer>& answers) {
-        driver.DropScript(Place);
+        driver_.DropScript(Place);
         if (Transport::IsUsbIo) {
-            driver.Script(Place, Silence);  // to the one for what is left from before
+            driver_.Script(Place, Silence);  // to the one for what is left from before
         }
         for (const Answer& answer : answers) {
-            driver.Script(Place, answer);
+            driver_.Script(Place, answer);
         }
     }
     void Start() {
-        listener->SetListener(&receiver);
-        listener->Start();
+        listener_->SetListener(&receiver_);
+        listener_->Start();
     }
     void WaitForMessages(std::size_t count) {
-        WaitUntil([&] { return receiver.Codes().size() >= count; });
+        WaitUntil([&] { return receiver_.Codes().size() >= count; });
     }
     void WaitForRead() {
-        WaitUntil([&] { return driver.Running(Place) == 1; });
+        WaitUntil([&] { return driver_.Running(Place) == 1; });
     }
     void StopWithin(std::uint64_t milliseconds) {
-        const Stopwatch watch(clock);
-        listener->Stop();
+        const Stopwatch watch(clock_);
+        listener_->Stop();
         watch.ExpectAtMost(milliseconds);
     }
 
-    const UsbIoPipe pipe{new UsbIo::CUsbIoPipe};
-    RecordingListener receiver;
-    std::unique_ptr<typename Transport::Listener> listener = Transport::Make(pipe);
+    const UsbIoPipe pipe_{new UsbIo::CUsbIoPipe};
+    RecordingListener receiver_;
+    std::unique_ptr<typename Transport::Listener> listener_ = Transport::Make(pipe_);
 };
 using BothTransports = testing::Types<OverNative, OverUsbIo>;
 TYPED_TEST_SUITE(InterruptListeners, BothTransports);
@@ -118,7 +118,7 @@ TYPED_TEST(InterruptListeners, TurnReadsIntoMessages) {
         SCOPED_TRACE(row.name);
         RecordingListener messages;
         this->Script(row.reads);
-        const auto watching = TypeParam::Make(this->pipe);
+        const auto watching = TypeParam::Make(this->pipe_);
         watching->SetListener(&messages);
         EXPECT_FALSE(watching->IsTouched());
         watching->Start();
@@ -126,20 +126,20 @@ TYPED_TEST(InterruptListeners, TurnReadsIntoMessages) {
         watching->Stop();  // the thread has ended by itself
         EXPECT_EQ(messages.Codes(), row.messages);
         EXPECT_EQ(watching->IsTouched(), row.touched);
-        EXPECT_EQ(this->driver.Running(this->Place), 0U);
+        EXPECT_EQ(this->driver_.Running(this->Place), 0U);
     }
 }
 
 TYPED_TEST(InterruptListeners, ReportNothingOnceTheirReceiverIsTakenAway) {
     this->Script({Press, Press, Silence});
-    this->receiver.onMessage = [this](std::uint32_t) { this->listener->ClearListener(); };
+    this->receiver_.onMessage = [this](std::uint32_t) { this->listener_->ClearListener(); };
     this->Start();
     this->WaitForMessages(1);
     SleepMilliseconds(100);  // the second one has come by then
     this->WaitForRead();
     this->StopWithin(10);
-    EXPECT_TRUE(this->listener->IsTouched());
-    EXPECT_THAT(this->receiver.Codes(), ElementsAre(MessageButtonData)) << "nor by Stop";
+    EXPECT_TRUE(this->listener_->IsTouched());
+    EXPECT_THAT(this->receiver_.Codes(), ElementsAre(MessageButtonData)) << "nor by Stop";
 }
 
 /// Wherever its thread is just then: before, in or after the start of a read, in the first one or a later
@@ -148,37 +148,37 @@ TYPED_TEST(InterruptListeners, StopAtOnce) {
     this->StopWithin(0);  // without a thread
     for (std::uint32_t round = 0; round < 100; ++round) {
         SCOPED_TRACE(round);
-        this->listener = TypeParam::Make(this->pipe);
+        this->listener_ = TypeParam::Make(this->pipe_);
         this->Script({{.data = {1}}, Silence});
-        this->listener->Start();
+        this->listener_->Start();
         SleepMilliseconds(round / 3);
         this->StopWithin(1);
-        EXPECT_EQ(this->driver.Running(this->Place), 0U);
+        EXPECT_EQ(this->driver_.Running(this->Place), 0U);
     }
 }
 
 TYPED_TEST(InterruptListeners, StopFromInsideAMessage) {
     std::atomic<bool> stopped = false;
     this->Script({Press});
-    this->receiver.onMessage = [&](std::uint32_t) {
-        EXPECT_TRUE(this->listener->IsTouched());
+    this->receiver_.onMessage = [&](std::uint32_t) {
+        EXPECT_TRUE(this->listener_->IsTouched());
         this->StopWithin(0);
         stopped = true;
     };
     this->Start();
     WaitUntil([&] { return stopped.load(); });
     SleepMilliseconds(100);
-    EXPECT_THAT(this->receiver.Codes(), ElementsAre(MessageButtonData));
-    EXPECT_EQ(this->driver.Running(this->Place), 0U);
+    EXPECT_THAT(this->receiver_.Codes(), ElementsAre(MessageButtonData));
+    EXPECT_EQ(this->driver_.Running(this->Place), 0U);
 }
 
 TYPED_TEST(InterruptListeners, EndWithAReceiverThatThrows) {
-    this->receiver.onMessage = [](std::uint32_t) { throw std::runtime_error("receiver"); };
+    this->receiver_.onMessage = [](std::uint32_t) { throw std::runtime_error("receiver"); };
     this->Script({Press});
     this->Start();
     this->WaitForMessages(1);
     SleepMilliseconds(10);
-    EXPECT_EQ(this->driver.Running(this->Place), 0U);
+    EXPECT_EQ(this->driver_.Running(this->Place), 0U);
     this->StopWithin(10);
 }
 
@@ -191,20 +191,20 @@ TYPED_TEST(InterruptListeners, TakeAFailureDuringTheStopForNoMessage) {
     this->Start();
     WaitUntil([&] { return isInRead.load(); });
     this->StopWithin(50);
-    EXPECT_THAT(this->receiver.Codes(), IsEmpty());
+    EXPECT_THAT(this->receiver_.Codes(), IsEmpty());
 }
 
 /// The thread comes back when nobody waits for it any more, and must find its things in place.
 TYPED_TEST(InterruptListeners, AreNotHeldUpByAReceiverThatDoesNotReturn) {
     const OwnedHandle release(MakeAutoResetEvent());
-    this->receiver.onMessage = [&](std::uint32_t) { Wait(release.Get(), Infinite); };
+    this->receiver_.onMessage = [&](std::uint32_t) { Wait(release.Get(), Infinite); };
     this->Script({Press});
     this->Start();
     this->WaitForMessages(1);
     this->StopWithin(11'000);
-    EXPECT_FALSE(TypeParam::IsUsbIo && this->pipe->IsOpen());
+    EXPECT_FALSE(TypeParam::IsUsbIo && this->pipe_->IsOpen());
     SignalEvent(release.Get());
-    this->listener->ClearListener();  // over USBIO, after the message where the thread could not be ended
+    this->listener_->ClearListener();  // over USBIO, after the message where the thread could not be ended
     SleepMilliseconds(10);
 }
 
@@ -213,25 +213,25 @@ TYPED_TEST(InterruptListeners, SayWhenTheThreadCannotBeMade) {
         return call == "StartThread" ? Errors::NoSystemResources : Errors::Success;
     });
     ExpectThrow<IOException>("could not create interrupt listener thread",
-                             [this] { this->listener->Start(); });
+                             [this] { this->listener_->Start(); });
     this->StopWithin(0);
 }
 
 TYPED_TEST(InterruptListeners, WorkOnTheCallersThreadToo) {
     this->Script({Press, Gone});
-    this->listener->SetListener(&this->receiver);
-    this->listener->Listen();
-    this->listener->DispatchEvent(1);
-    this->listener->DispatchEvent(0);
-    EXPECT_THAT(this->receiver.Codes(), ElementsAre(MessageButtonData, MessageButtonData))
+    this->listener_->SetListener(&this->receiver_);
+    this->listener_->Listen();
+    this->listener_->DispatchEvent(1);
+    this->listener_->DispatchEvent(0);
+    EXPECT_THAT(this->receiver_.Codes(), ElementsAre(MessageButtonData, MessageButtonData))
         << "nothing was started whose end would be news";
 
-    this->listener = TypeParam::Make(this->pipe);
+    this->listener_ = TypeParam::Make(this->pipe_);
     this->Script({Silence});
     this->Start();
     this->Start();  // once is enough
     this->StopWithin(1);
-    EXPECT_EQ(this->driver.Running(this->Place), 0U);
+    EXPECT_EQ(this->driver_.Running(this->Place), 0U);
 }
 
 using NativeInterruptListener = InterruptListeners<OverNative>;
@@ -268,7 +268,7 @@ TEST_F(NativeInterruptListener, IsBoundedWhateverHoldsUpTheOpeningOfThePipe) {
             SleepMilliseconds(row.opensAfter);
             return row.transcript.empty() ? Errors::FileNotFound : Errors::Success;
         });
-        const Stopwatch watch(clock);
+        const Stopwatch watch(clock_);
         {
             InterruptListener other("native/1");
             ExpectThrow<IOException>("interrupt listener thread had timeout", [&] { other.Start(); });
@@ -284,30 +284,30 @@ TEST_F(NativeInterruptListener, EndsAReadThatCannotBeCancelledWithItsPipe) {
     Script({{.after = Never, .cancelledAfter = Never}});
     Start();
     WaitForRead();
-    const Stopwatch watch(clock);
-    listener->Stop();
+    const Stopwatch watch(clock_);
+    listener_->Stop();
     watch.ExpectBetween(10'000, 11'000);
-    EXPECT_EQ(driver.RunningTransfers(), 0U);
-    EXPECT_THAT(driver.TakeTranscript(), testing::Contains("close " + InterruptPath));
-    EXPECT_THAT(receiver.Codes(), IsEmpty());
+    EXPECT_EQ(driver_.RunningTransfers(), 0U);
+    EXPECT_THAT(driver_.TakeTranscript(), testing::Contains("close " + InterruptPath));
+    EXPECT_THAT(receiver_.Codes(), IsEmpty());
 }
 
 using UsbIoInterruptListener = InterruptListeners<OverUsbIo>;
 
 TEST_F(UsbIoInterruptListener, ThrowsAnInterruptFromBeforeAway) {
-    driver.Script(Place, {.data = {1}, .after = 1});
+    driver_.Script(Place, {.data = {1}, .after = 1});
     Start();
     SleepMilliseconds(50);
     WaitForRead();
-    listener->Stop();
-    EXPECT_THAT(receiver.Codes(), IsEmpty());
-    EXPECT_FALSE(listener->IsTouched());
+    listener_->Stop();
+    EXPECT_THAT(receiver_.Codes(), IsEmpty());
+    EXPECT_FALSE(listener_->IsTouched());
 }
 
 TEST_F(UsbIoInterruptListener, ReadsForTenMillisecondsAndThenForASecondEach) {
     std::vector<std::uint64_t> starts;
     for (int i = 0; i < 4; ++i) {
-        driver.Script(Place, {.after = Never, .onStart = [&] { starts.push_back(ClockScheduler().Now()); }});
+        driver_.Script(Place, {.after = Never, .onStart = [&] { starts.push_back(ClockScheduler().Now()); }});
     }
     Start();
     SleepMilliseconds(2500);
@@ -316,9 +316,9 @@ TEST_F(UsbIoInterruptListener, ReadsForTenMillisecondsAndThenForASecondEach) {
     const std::uint64_t expected[] = {10'000, 1'000'000, 1'000'000};
     for (std::size_t i = 0; i < 3; ++i) {
         EXPECT_NEAR(static_cast<double>(starts[i + 1] - starts[i]), static_cast<double>(expected[i]),
-                    clock.IsVirtual() ? 0 : 150'000);
+                    clock_.IsVirtual() ? 0 : 150'000);
     }
-    EXPECT_THAT(receiver.Codes(), IsEmpty());
+    EXPECT_THAT(receiver_.Codes(), IsEmpty());
 }
 
 TEST_F(UsbIoInterruptListener, SaysWhenItsThreadDoesNotReportItsStart) {
@@ -327,17 +327,17 @@ TEST_F(UsbIoInterruptListener, SaysWhenItsThreadDoesNotReportItsStart) {
     InstallCallFilter([&](std::string_view call) {
         return call == "SignalEvent" && !hasFailed.exchange(true) ? Errors::InvalidHandle : Errors::Success;
     });
-    const Stopwatch watch(clock);
-    ExpectThrow<IOException>("interrupt listener thread had timeout", [this] { listener->Start(); });
+    const Stopwatch watch(clock_);
+    ExpectThrow<IOException>("interrupt listener thread had timeout", [this] { listener_->Start(); });
     watch.Expect(2000);
     WaitForRead();  // it runs all the same
     StopWithin(1);
-    EXPECT_EQ(driver.Running(Place), 0U);
+    EXPECT_EQ(driver_.Running(Place), 0U);
 }
 
 TEST_F(UsbIoInterruptListener, TakesItsReceiverAwayOnlyAfterTheMessageUnderWay) {
     std::atomic<bool> inMessage = false;
-    receiver.onMessage = [&](std::uint32_t) {
+    receiver_.onMessage = [&](std::uint32_t) {
         inMessage = true;
         SleepMilliseconds(100);
         inMessage = false;
@@ -345,9 +345,9 @@ TEST_F(UsbIoInterruptListener, TakesItsReceiverAwayOnlyAfterTheMessageUnderWay) 
     Script({Press});
     Start();
     WaitForMessages(1);
-    listener->ClearListener();
+    listener_->ClearListener();
     EXPECT_FALSE(inMessage);
-    listener->Stop();
+    listener_->Stop();
 }
 
 TEST(UsbIoInterruptListenerRace, NoInterruptIsLostOrCountedTwice) {

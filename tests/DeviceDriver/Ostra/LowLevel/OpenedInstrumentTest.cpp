@@ -19,10 +19,10 @@ using Codes = std::vector<std::uint32_t>;
 
 class OpenedInstrument : public testing::TestWithParam<Transport> {
   protected:
-    TestClock clock{TestTime::Virtual};
-    SimulatedHost host{GetParam()};
-    Simulator::SimulatedInstrument& instrument = host.Add("a");
-    const std::string transport =
+    TestClock clock_{TestTime::Virtual};
+    SimulatedHost host_{GetParam()};
+    Simulator::SimulatedInstrument& instrument_ = host_.Add("a");
+    const std::string transport_ =
         GetParam() == Transport::Native ? "PellandoFunctionality_PC" : "PellandoFunctionality_Win64";
 };
 INSTANTIATE_TEST_SUITE_P(Transports, OpenedInstrument, testing::Values(Transport::Native, Transport::UsbIo),
@@ -50,16 +50,16 @@ TEST_P(OpenedInstrument, SendsItsMessagesUntilTheListenerIsRemoved) {
                 opened.removeListener(&listener);
             }
             if (row.isPressed) {
-                instrument.PressButton();
+                instrument_.PressButton();
                 SleepMilliseconds(50);
             }
             if (row.isUnplugged) {
-                instrument.Unplug();
+                instrument_.Unplug();
                 SleepMilliseconds(50);
             }
         }
         EXPECT_EQ(listener.Codes(), row.messages);
-        instrument.PlugIn();
+        instrument_.PlugIn();
     }
 }
 
@@ -69,12 +69,12 @@ TEST_P(OpenedInstrument, ClosesWithoutWaitingForTheDeviceLock) {
     SleepMilliseconds(50);
     Varnholt::Utilities::Multithreading::Mutex mutex(std::string(Name(GetParam())) + "a");
     mutex.Lock();
-    const Stopwatch watch(clock);
+    const Stopwatch watch(clock_);
     BackgroundThread closer([&] { opened.reset(); });
     WaitUntil([&] { return closer.HasEnded(); });
     watch.ExpectAtMost(5);
     mutex.Unlock();
-    EXPECT_FALSE(instrument.Claimed());
+    EXPECT_FALSE(instrument_.Claimed());
     EXPECT_EQ(listener.Codes(), Codes());
 }
 
@@ -96,7 +96,7 @@ Lines TraceOf(Operation operation) {
 }
 
 TEST_P(OpenedInstrument, FailuresNameTheOperationsThatTheyLeft) {
-    host.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 1:stall; bulk-in 0:stall"));
+    host_.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 1:stall; bulk-in 0:stall"));
     PellandoFunctionality opened(nullptr, 0);
     std::uint8_t byte = 0;
     const std::pair<const char*, std::function<void()>> cases[] = {
@@ -107,23 +107,23 @@ TEST_P(OpenedInstrument, FailuresNameTheOperationsThatTheyLeft) {
         ASSERT_GT(trace.size(), 2U);
         trace.erase(trace.begin(), trace.end() - 2);
         EXPECT_THAT(trace,
-                    ElementsAre(transport + operation, std::string("PellandoFunctionality") + operation));
+                    ElementsAre(transport_ + operation, std::string("PellandoFunctionality") + operation));
     }
 }
 
 TEST_P(OpenedInstrument, AnOpeningThatFailsNamesEachOperationOnce) {
-    host.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 0:stall"));
+    host_.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 0:stall"));
     const auto open = [] { PellandoFunctionality(nullptr, 0); };
     Lines trace = TraceOf(open);
     ASSERT_GT(trace.size(), 3U);
     trace.erase(trace.begin(), trace.end() - 3);
     const std::string constructor = "PellandoFunctionality::PellandoFunctionality";
-    EXPECT_THAT(trace, ElementsAre(transport + "::Reset", "PellandoFunctionality::Reset", constructor));
+    EXPECT_THAT(trace, ElementsAre(transport_ + "::Reset", "PellandoFunctionality::Reset", constructor));
 
-    instrument.Unplug();
+    instrument_.Unplug();
     const std::string search =
-        transport + (GetParam() == Transport::Native ? "::GetDeviceAddress" : "::InitUSBIO");
-    EXPECT_THAT(TraceOf(open), ElementsAre(search, search, transport + "::" + transport,
+        transport_ + (GetParam() == Transport::Native ? "::GetDeviceAddress" : "::InitUSBIO");
+    EXPECT_THAT(TraceOf(open), ElementsAre(search, search, transport_ + "::" + transport_,
                                            "PellandoFunctionalityByte::Instance", constructor))
         << "the place of the failure, then the operations";
 }

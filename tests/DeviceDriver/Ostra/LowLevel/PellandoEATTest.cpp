@@ -62,14 +62,14 @@ Entries EntriesOf(const PellandoEAT& table) {
 
 class FreshTable : public testing::Test {
   protected:
-    FreshTable() { table.InitializeEmtpyEAT(); }
-    PellandoEAT table;
+    FreshTable() { table_.InitializeEmtpyEAT(); }
+    PellandoEAT table_;
 };
 
 TEST_F(FreshTable, IsTheOneOfAFreshInstrumentByteForByte) {
-    EXPECT_EQ(EntriesOf(table), Fresh);
+    EXPECT_EQ(EntriesOf(table_), Fresh);
     Bytes dumped(EepromMap::TableArea, 0xFF);
-    table.Dump(dumped.begin(), dumped.end());
+    table_.Dump(dumped.begin(), dumped.end());
     EXPECT_EQ(dumped, TableBytes(1, 334, Fresh));
     EXPECT_EQ(EntriesOf(PellandoEAT(dumped.begin())), Fresh);
 }
@@ -77,19 +77,19 @@ TEST_F(FreshTable, IsTheOneOfAFreshInstrumentByteForByte) {
 TEST_F(FreshTable, SizeIsTheDistanceToTheNextEntry) {
     const std::pair<std::uint16_t, std::int32_t> sizes[] = {{10010, 512}, {11021, 4}, {3009, 8}, {3013, 4}};
     for (const auto& [id, size] : sizes) {
-        EXPECT_EQ(table.SizeOf(id), size) << id;
+        EXPECT_EQ(table_.SizeOf(id), size) << id;
     }
-    ExpectThrow<ResourceException>("id 5 doesn't exist", [&] { table.SizeOf(5); });
-    ExpectThrow<ResourceException>("id 5 doesn't exist", [&] { table.AddressOf(5); });
+    ExpectThrow<ResourceException>("id 5 doesn't exist", [&] { table_.SizeOf(5); });
+    ExpectThrow<ResourceException>("id 5 doesn't exist", [&] { table_.AddressOf(5); });
     // Nothing says where the last entry ends.
-    ExpectThrow<ResourceException>("id 2 doesn't exist", [&] { table.SizeOf(2); });
+    ExpectThrow<ResourceException>("id 2 doesn't exist", [&] { table_.SizeOf(2); });
 
-    EXPECT_TRUE(table.IsEntryInLogArea(11021, 4095 - 3108));
-    EXPECT_FALSE(table.IsEntryInLogArea(11021, 4096 - 3108));
-    EXPECT_FALSE(table.IsEntryInLogArea(10000, 0xFFFFFFFF));
-    table.GetDatastore().GetProperty(10000).Assign(std::int32_t{-8});
-    EXPECT_TRUE(table.IsEntryInLogArea(10000, 4103)) << "the sum alone decides";
-    EXPECT_FALSE(table.IsEntryInLogArea(10000, 4104));
+    EXPECT_TRUE(table_.IsEntryInLogArea(11021, 4095 - 3108));
+    EXPECT_FALSE(table_.IsEntryInLogArea(11021, 4096 - 3108));
+    EXPECT_FALSE(table_.IsEntryInLogArea(10000, 0xFFFFFFFF));
+    table_.GetDatastore().GetProperty(10000).Assign(std::int32_t{-8});
+    EXPECT_TRUE(table_.IsEntryInLogArea(10000, 4103)) << "the sum alone decides";
+    EXPECT_FALSE(table_.IsEntryInLogArea(10000, 4104));
 }
 
 TEST(PellandoEAT, HeaderDecidesWhetherAndHowFarTheTableIsRead) {
@@ -175,28 +175,28 @@ TEST_F(FreshTable, EnsureConsistencyMovesTheSetAndFitSectionItsEnd) {
     Properties set = PellandoEAT::GetDefaultCalibrationData();
     set.SetProperty(3009, Property(Longs(3)));
     std::map<int, int> moved{{3010, 4}, {3011, 4}, {3012, 4}, {3013, 4}};
-    table.EnsureConsistency(set);
-    EXPECT_EQ(MovedEntries(table), moved);
-    table.FitSection(set, 0);
+    table_.EnsureConsistency(set);
+    EXPECT_EQ(MovedEntries(table_), moved);
+    table_.FitSection(set, 0);
     moved[2] = 4;
-    EXPECT_EQ(MovedEntries(table), moved);
-    table.EnsureConsistency(set);
-    EXPECT_EQ(MovedEntries(table), moved) << "a second call must find nothing to do";
-    table.FitSection(PellandoEAT::GetDefaultCalibrationData(), 0);
-    EXPECT_EQ(EntriesOf(table), Fresh) << "and the way back must be open";
+    EXPECT_EQ(MovedEntries(table_), moved);
+    table_.EnsureConsistency(set);
+    EXPECT_EQ(MovedEntries(table_), moved) << "a second call must find nothing to do";
+    table_.FitSection(PellandoEAT::GetDefaultCalibrationData(), 0);
+    EXPECT_EQ(EntriesOf(table_), Fresh) << "and the way back must be open";
 }
 
 TEST_F(FreshTable, CopiesOfTheLogMoveEachForItself) {
     const Bytes image = FreshImage();
-    PellandoLog log(table, image.begin());
+    PellandoLog log(table_, image.begin());
     log.SetItem(10012, Property(Longs{1, 2, 3}));
     std::map<int, int> moved{{10013, 8}, {10020, 8}, {10021, 8}};
-    table.EnsureConsistency(log);
-    EXPECT_EQ(MovedEntries(table), moved);
-    table.FitSection(log.GetItems(), 0);
-    table.FitSection(log.GetItems(), 1000);
+    table_.EnsureConsistency(log);
+    EXPECT_EQ(MovedEntries(table_), moved);
+    table_.FitSection(log.GetItems(), 0);
+    table_.FitSection(log.GetItems(), 1000);
     moved.insert({{1, 8}, {11013, 8}, {11020, 8}, {11021, 8}, {3, 8}});
-    EXPECT_EQ(MovedEntries(table), moved);
+    EXPECT_EQ(MovedEntries(table_), moved);
 }
 
 TEST_F(FreshTable, EnsureConsistencyThatFailsChangesNothing) {
@@ -204,29 +204,29 @@ TEST_F(FreshTable, EnsureConsistencyThatFailsChangesNothing) {
     set.SetProperty(1000, Property(Longs{1, 2, 3}));
     set.SetProperty(1001, Property(Longs{1, 2, 3}));
     set.SetProperty(77, Property(std::int32_t{1}));
-    ExpectThrow<ResourceException>("id 77 doesn't exist", [&] { table.EnsureConsistency(set); });
-    EXPECT_EQ(EntriesOf(table), Fresh);
-    ExpectThrow<ResourceException>("id 77 doesn't exist", [&] { table.FitSection(set, 0); });
-    EXPECT_EQ(EntriesOf(table), Fresh);
+    ExpectThrow<ResourceException>("id 77 doesn't exist", [&] { table_.EnsureConsistency(set); });
+    EXPECT_EQ(EntriesOf(table_), Fresh);
+    ExpectThrow<ResourceException>("id 77 doesn't exist", [&] { table_.FitSection(set, 0); });
+    EXPECT_EQ(EntriesOf(table_), Fresh);
 
     const Bytes image = FreshImage();
-    PellandoLog log(table, image.begin());
+    PellandoLog log(table_, image.begin());
     log.SetItem(10001, Property(Longs{1, 2}));
     log.SetItem(10100, Property(std::int32_t{1}));
-    ExpectThrow<ResourceException>("id 10100 doesn't exist", [&] { table.EnsureConsistency(log); });
-    EXPECT_EQ(EntriesOf(table), Fresh);
+    ExpectThrow<ResourceException>("id 10100 doesn't exist", [&] { table_.EnsureConsistency(log); });
+    EXPECT_EQ(EntriesOf(table_), Fresh);
 }
 
 TEST_F(FreshTable, AddressesBeyond32BitsAreCorrupt) {
-    table.GetDatastore().GetProperty(1001).Assign(std::int32_t{-2147483647});
-    table.GetDatastore().GetProperty(1002).Assign(std::int32_t{2147483647});
-    ExpectThrow<DataException>(Corrupt, [&] { table.SizeOf(1001); });
+    table_.GetDatastore().GetProperty(1001).Assign(std::int32_t{-2147483647});
+    table_.GetDatastore().GetProperty(1002).Assign(std::int32_t{2147483647});
+    ExpectThrow<DataException>(Corrupt, [&] { table_.SizeOf(1001); });
     Properties set;
     set.SetProperty(1000, Property(Longs{1, 2, 3}));
     set.SetProperty(1002, Property(Longs{1, 2}));
-    const Entries before = EntriesOf(table);
-    ExpectThrow<DataException>(Corrupt, [&] { table.EnsureConsistency(set); });
-    EXPECT_EQ(EntriesOf(table), before);
+    const Entries before = EntriesOf(table_);
+    ExpectThrow<DataException>(Corrupt, [&] { table_.EnsureConsistency(set); });
+    EXPECT_EQ(EntriesOf(table_), before);
 }
 
 TEST(SectionReader, FollowsTheTableWhereItCanBeUsedAndRefusesItWhereNot) {

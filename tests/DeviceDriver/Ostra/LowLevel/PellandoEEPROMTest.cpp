@@ -37,56 +37,56 @@ Property Long(std::int32_t value) {
 
 class EepromTest : public testing::Test {
   protected:
-    EepromTest() { instrument.eeprom = FreshImage(); }
+    EepromTest() { instrument_.eeprom = FreshImage(); }
 
     void Load() {
-        eeprom = std::make_unique<PellandoEEPROM>(Open(instrument));
-        instrument.TakeCommands();
+        eeprom_ = std::make_unique<PellandoEEPROM>(Open(instrument_));
+        instrument_.TakeCommands();
     }
     void Store(std::initializer_list<std::pair<std::uint16_t, std::int32_t>> values) {
-        set = Properties();
+        set_ = Properties();
         for (const auto& [id, value] : values) {
-            set.SetProperty(id, Long(value));
+            set_.SetProperty(id, Long(value));
         }
-        eeprom->Store(set);
+        eeprom_->Store(set_);
     }
     void ChangeLog(int times) {
         for (int change = 1; change <= times; ++change) {
-            eeprom->SetProperty(10002, Long(change));
+            eeprom_->SetProperty(10002, Long(change));
         }
     }
     void ExpectLocked() {
-        ExpectThrow<ResourceException>("EEPROM already locked", [&] { eeprom->Lock(); });
+        ExpectThrow<ResourceException>("EEPROM already locked", [&] { eeprom_->Lock(); });
     }
 
-    FakeInstrument instrument;
-    std::unique_ptr<PellandoEEPROM> eeprom;
-    Properties set;
+    FakeInstrument instrument_;
+    std::unique_ptr<PellandoEEPROM> eeprom_;
+    Properties set_;
 };
 
 TEST_F(EepromTest, IsReadInTwoHalvesAndThenServedFromMemory) {
-    Protocol::StoreBig32(&instrument.eeprom[4712], 4711);
-    eeprom = std::make_unique<PellandoEEPROM>(Open(instrument));
-    EXPECT_THAT(instrument.TakeCommands(),
+    Protocol::StoreBig32(&instrument_.eeprom[4712], 4711);
+    eeprom_ = std::make_unique<PellandoEEPROM>(Open(instrument_));
+    EXPECT_THAT(instrument_.TakeCommands(),
                 ElementsAre(Command{"ReadEEPROM", 0, 4096}, Command{"ReadEEPROM", 4096, 4096}));
-    EXPECT_EQ(eeprom->Load(4000).AsLong(), 4711);
-    EXPECT_EQ(eeprom->Load(10010).AsLongVector(), Longs(128, 0));
-    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+    EXPECT_EQ(eeprom_->Load(4000).AsLong(), 4711);
+    EXPECT_EQ(eeprom_->Load(10010).AsLongVector(), Longs(128, 0));
+    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
     for (const std::uint16_t id : std::vector<std::uint16_t>{2009, 5, 11000, 10100, 20001, 20002, 65535}) {
         ExpectThrow<ResourceException>("unknown property id = " + std::to_string(id),
-                                       [&] { eeprom->Load(id); });
+                                       [&] { eeprom_->Load(id); });
     }
 }
 
 TEST_F(EepromTest, CannotBeBuiltFromWhatCannotBeUsed) {
-    Protocol::StoreBig16(&instrument.eeprom[4096], 2);
-    ExpectThrow<DataException>("corrupt EAT detected!!", [&] { PellandoEEPROM broken(Open(instrument)); });
-    EXPECT_EQ(instrument.TakeCommands().size(), 2U) << "nothing may be written";
-    instrument.eeprom = FreshImage();
+    Protocol::StoreBig16(&instrument_.eeprom[4096], 2);
+    ExpectThrow<DataException>("corrupt EAT detected!!", [&] { PellandoEEPROM broken(Open(instrument_)); });
+    EXPECT_EQ(instrument_.TakeCommands().size(), 2U) << "nothing may be written";
+    instrument_.eeprom = FreshImage();
     for (const std::size_t command : {0U, 1U}) {
-        instrument.failingCommand = command;
-        EXPECT_THAT([&] { PellandoEEPROM broken(Open(instrument)); }, testing::Throws<IOException>());
-        EXPECT_EQ(instrument.TakeCommands().size(), command + 1);
+        instrument_.failingCommand = command;
+        EXPECT_THAT([&] { PellandoEEPROM broken(Open(instrument_)); }, testing::Throws<IOException>());
+        EXPECT_EQ(instrument_.TakeCommands().size(), command + 1);
     }
 }
 
@@ -100,24 +100,24 @@ TEST_F(EepromTest, LoadFillsSetsByNameOrByIdentifier) {
     for (const Case& row : {Case{"CalibrationData", 28, 1000, 3013}, Case{"LogData", 12, 10000, 10021},
                             Case{"EATData", 55, 10000, 2}}) {
         Properties named(row.name);
-        EXPECT_EQ(&eeprom->Load(named), &named);
+        EXPECT_EQ(&eeprom_->Load(named), &named);
         ASSERT_EQ(named.GetItemCount(), row.entries) << row.name;
         EXPECT_EQ(named.GetPropertyKeys().front(), row.first);
         EXPECT_EQ(named.GetPropertyKeys().back(), row.last);
     }
     for (const char* other : {"", "calibrationdata", "CalibrationData "}) {
         Properties named(other);
-        EXPECT_EQ(eeprom->Load(named).GetItemCount(), 0U) << other;
+        EXPECT_EQ(eeprom_->Load(named).GetItemCount(), 0U) << other;
     }
     Properties some("CalibrationData");
     some.SetProperty(2005, Long(7));
     some.SetProperty(3009, Property());
-    eeprom->Load(some);
+    eeprom_->Load(some);
     EXPECT_EQ(some.GetItemCount(), 2U);
     EXPECT_EQ(some.GetProperty(2005).AsLong(), 7);
     EXPECT_EQ(some.GetProperty(3009).AsLongVector(), (Longs{-1, -1}));
     some.SetProperty(20001, Long(1));
-    ExpectThrow<ResourceException>("unknown property id = 20001", [&] { eeprom->Load(some); });
+    ExpectThrow<ResourceException>("unknown property id = 20001", [&] { eeprom_->Load(some); });
 }
 
 TEST_F(EepromTest, StoreObeysItsRequests) {
@@ -140,24 +140,24 @@ TEST_F(EepromTest, StoreObeysItsRequests) {
          }) {
         SCOPED_TRACE(row.name);
         Store(row.values);
-        EXPECT_THAT(instrument.TakeCommands(),
+        EXPECT_THAT(instrument_.TakeCommands(),
                     ElementsAreArray(row.writesLog ? LogWrites : std::vector<Command>()));
-        EXPECT_EQ(set.Contains(20001) ? set.GetProperty(20001).AsLong() : -1, row.writeThroughAfterwards);
+        EXPECT_EQ(set_.Contains(20001) ? set_.GetProperty(20001).AsLong() : -1, row.writeThroughAfterwards);
         ExpectLocked();
     }
     Store({{10002, 5}, {20002, 1}});
     for (const std::size_t copy : {0U, 2048U}) {
-        EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[copy]), 5U);
-        EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[copy + 8]), 5U);
+        EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[copy]), 5U);
+        EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[copy + 8]), 5U);
     }
-    EXPECT_EQ(eeprom->Load(1211).AsLong(), 5);
-    EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[4708]), 0xFFFFFFFF)
+    EXPECT_EQ(eeprom_->Load(1211).AsLong(), 5);
+    EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[4708]), 0xFFFFFFFF)
         << "calibration changes in memory only";
 }
 
 TEST_F(EepromTest, FailedWriteThroughLocksAgain) {
     Load();
-    instrument.failingCommand = 0;
+    instrument_.failingCommand = 0;
     EXPECT_THAT([&] { Store({{20001, 1}}); }, testing::Throws<IOException>());
     ExpectLocked();
 }
@@ -165,44 +165,44 @@ TEST_F(EepromTest, FailedWriteThroughLocksAgain) {
 TEST_F(EepromTest, LockGuardsWriteThrough) {
     Load();
     ExpectLocked();
-    ExpectThrow<ResourceException>("EEPROM access denied", [&] { eeprom->WriteThrough(); });
-    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
-    eeprom->Unlock();
-    ExpectThrow<ResourceException>("EEPROM already unlocked", [&] { eeprom->Unlock(); });
-    eeprom->WriteThrough();
-    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
+    ExpectThrow<ResourceException>("EEPROM access denied", [&] { eeprom_->WriteThrough(); });
+    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
+    eeprom_->Unlock();
+    ExpectThrow<ResourceException>("EEPROM already unlocked", [&] { eeprom_->Unlock(); });
+    eeprom_->WriteThrough();
+    EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites));
 }
 
 TEST_F(EepromTest, DueLogIsWrittenBeforeTheNextChange) {
     Load();
     ChangeLog(20);
-    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
-    eeprom->GetLog();
-    eeprom->GetLog(false);
-    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
-    eeprom->SetProperty(10002, Long(21));
-    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
-    EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[8]), 20U) << "the change comes behind the dump";
-    EXPECT_EQ(eeprom->Load(10002).AsLong(), 21);
+    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
+    eeprom_->GetLog();
+    eeprom_->GetLog(false);
+    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
+    eeprom_->SetProperty(10002, Long(21));
+    EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites));
+    EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[8]), 20U) << "the change comes behind the dump";
+    EXPECT_EQ(eeprom_->Load(10002).AsLong(), 21);
 }
 
 TEST_F(EepromTest, BinaryAreasAreWrittenAndReadDirectly) {
     Load();
     Bytes block(1904);
     std::ranges::generate(block, [byte = std::uint8_t{0}]() mutable { return byte += 7; });
-    eeprom->StoreBinary(10100, block);
-    EXPECT_THAT(instrument.TakeCommands(),
+    eeprom_->StoreBinary(10100, block);
+    EXPECT_THAT(instrument_.TakeCommands(),
                 ElementsAre(Command{"WriteEEPROM", 1064, 256}, Command{"WriteEEPROM", 1320, 256},
                             Command{"WriteEEPROM", 1576, 256}, Command{"WriteEEPROM", 1832, 216},
                             Command{"WriteEEPROM", 3112, 256}, Command{"WriteEEPROM", 3368, 256},
                             Command{"WriteEEPROM", 3624, 256}, Command{"WriteEEPROM", 3880, 152}));
-    EXPECT_EQ(eeprom->LoadBinary(10100), block);
-    eeprom->StoreBinary(10215, {1, 2, 3, 4});
-    EXPECT_EQ(eeprom->LoadBinary(10215), (Bytes{1, 2, 3, 4}));
-    EXPECT_EQ(eeprom->LoadBinary(10216), (Bytes{0, 1, 0x01, 0x4E})) << "the words behind are the table";
-    EXPECT_EQ(eeprom->LoadBinary(10239).size(), 4U);
-    EXPECT_THAT(eeprom->LoadBinary(10099), IsEmpty());
-    EXPECT_THAT(eeprom->LoadBinary(10240), IsEmpty());
+    EXPECT_EQ(eeprom_->LoadBinary(10100), block);
+    eeprom_->StoreBinary(10215, {1, 2, 3, 4});
+    EXPECT_EQ(eeprom_->LoadBinary(10215), (Bytes{1, 2, 3, 4}));
+    EXPECT_EQ(eeprom_->LoadBinary(10216), (Bytes{0, 1, 0x01, 0x4E})) << "the words behind are the table";
+    EXPECT_EQ(eeprom_->LoadBinary(10239).size(), 4U);
+    EXPECT_THAT(eeprom_->LoadBinary(10099), IsEmpty());
+    EXPECT_THAT(eeprom_->LoadBinary(10240), IsEmpty());
 }
 
 TEST_F(EepromTest, BinaryDataThatDoesNotFitIsRefusedBeforeAnythingIsWritten) {
@@ -230,13 +230,13 @@ TEST_F(EepromTest, BinaryDataThatDoesNotFitIsRefusedBeforeAnythingIsWritten) {
          }) {
         SCOPED_TRACE(testing::Message() << row.id << ", " << row.size << " bytes");
         const Bytes data(row.size, 0x55);
-        const Bytes before = instrument.eeprom;
+        const Bytes before = instrument_.eeprom;
         if (row.refusal) {
-            ExpectThrow<ResourceException>(row.refusal, [&] { eeprom->StoreBinary(row.id, data); });
-            EXPECT_EQ(instrument.eeprom, before);
+            ExpectThrow<ResourceException>(row.refusal, [&] { eeprom_->StoreBinary(row.id, data); });
+            EXPECT_EQ(instrument_.eeprom, before);
         } else {
-            eeprom->StoreBinary(row.id, data);
-            EXPECT_EQ(Bytes(instrument.eeprom.begin() + 4096, instrument.eeprom.end()),
+            eeprom_->StoreBinary(row.id, data);
+            EXPECT_EQ(Bytes(instrument_.eeprom.begin() + 4096, instrument_.eeprom.end()),
                       Bytes(before.begin() + 4096, before.end()));
         }
     }
@@ -244,11 +244,11 @@ TEST_F(EepromTest, BinaryDataThatDoesNotFitIsRefusedBeforeAnythingIsWritten) {
 
 TEST_F(EepromTest, DumpOfAFreshInstrumentIsTheFreshImage) {
     Load();
-    EXPECT_EQ(eeprom->Dump(), FreshImage());
-    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+    EXPECT_EQ(eeprom_->Dump(), FreshImage());
+    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
     ChangeLog(20);
-    const Bytes image = eeprom->Dump();
-    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites)) << "which was due";
+    const Bytes image = eeprom_->Dump();
+    EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites)) << "which was due";
     EXPECT_EQ(Protocol::LoadBig32(&image[2048 + 8]), 20U);
 }
 
@@ -276,10 +276,10 @@ TEST(EepromImages, ValuesThatChangedTheirSizeReadBackRight) {
 
 TEST_F(EepromTest, DumpRefusesOnlyWhatDoesNotFitTheImage) {
     Load();
-    eeprom->SetProperty(3013, Property(Longs(861, 9)));
-    ExpectThrow<ResourceException>("Configuration data dump target too small", [&] { eeprom->Dump(); });
-    eeprom->SetProperty(3013, Long(9));
-    EXPECT_EQ(Protocol::LoadBig32(&eeprom->Dump()[4752]), 9U) << "and can when it fits again";
+    eeprom_->SetProperty(3013, Property(Longs(861, 9)));
+    ExpectThrow<ResourceException>("Configuration data dump target too small", [&] { eeprom_->Dump(); });
+    eeprom_->SetProperty(3013, Long(9));
+    EXPECT_EQ(Protocol::LoadBig32(&eeprom_->Dump()[4752]), 9U) << "and can when it fits again";
 }
 
 /// Where the table has a section elsewhere, the values are written where they always are all the same.
@@ -302,22 +302,22 @@ TEST_F(EepromTest, TablesThatHaveAnythingElsewhereChangeNothingOfWhatIsWritten) 
              Case{"main log not quite there", 12, 1, 1067},
          }) {
         SCOPED_TRACE(row.name);
-        eeprom.reset();
-        instrument.eeprom = FreshImage();
-        std::uint8_t* const entry = &instrument.eeprom[4096 + 4 + 6 * row.entry];
+        eeprom_.reset();
+        instrument_.eeprom = FreshImage();
+        std::uint8_t* const entry = &instrument_.eeprom[4096 + 4 + 6 * row.entry];
         Protocol::StoreBig16(entry, row.id);
         Protocol::StoreBig32(entry + 2, row.address);
         Load();
         ChangeLog(21);
-        EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites)) << "when it was due";
-        eeprom->SetProperty(1211, Long(77));
-        const Bytes image = eeprom->Dump();
+        EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites)) << "when it was due";
+        eeprom_->SetProperty(1211, Long(77));
+        const Bytes image = eeprom_->Dump();
         EXPECT_EQ(Protocol::LoadBig32(&image[row.placeOf1211]), 77U);
         EXPECT_EQ(Protocol::LoadBig32(&image[8]), 21U);
         EXPECT_EQ(Bytes(image.begin(), image.begin() + 1064),
                   Bytes(image.begin() + 2048, image.begin() + 3112));
-        eeprom.reset();
-        EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites)) << "at the end";
+        eeprom_.reset();
+        EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites)) << "at the end";
     }
 }
 
@@ -326,32 +326,32 @@ TEST_F(EepromTest, DestructorWritesTheLogTwiceOrReportsThatItIsLost) {
         Load();
         std::string reason;
         if (reported) {
-            eeprom->ReportLostLog([&](const std::string& text) {
+            eeprom_->ReportLostLog([&](const std::string& text) {
                 reason = text;
                 throw std::runtime_error("must not get out");
             });
         }
-        instrument.failingCommand = 3;
-        eeprom.reset();
+        instrument_.failingCommand = 3;
+        eeprom_.reset();
         EXPECT_EQ(reason, reported ? "the fake fails" : "");
-        EXPECT_EQ(instrument.TakeCommands().size(), 4U) << "one failure ends it";
-        instrument.failingCommand = ~std::size_t{0};
+        EXPECT_EQ(instrument_.TakeCommands().size(), 4U) << "one failure ends it";
+        instrument_.failingCommand = ~std::size_t{0};
     }
     Load();
-    eeprom->ReportLostLog([](const std::string&) { ADD_FAILURE() << "nothing was lost"; });
-    eeprom.reset();
-    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
-    EXPECT_EQ(instrument.eeprom, FreshImage());
+    eeprom_->ReportLostLog([](const std::string&) { ADD_FAILURE() << "nothing was lost"; });
+    eeprom_.reset();
+    EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites));
+    EXPECT_EQ(instrument_.eeprom, FreshImage());
 }
 
 TEST_F(EepromTest, FailureInTheSecondCopyOfTheLogLeavesThatOneOld) {
     Load();
-    eeprom->SetProperty(10002, Long(5));
-    instrument.failingCommand = 5;
-    ExpectThrow<IOException>("the fake fails", [&] { eeprom->DumpLog(); });
-    EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites.begin(), LogWrites.begin() + 6));
-    EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[8]), 5U);
-    EXPECT_EQ(Protocol::LoadBig32(&instrument.eeprom[2048 + 8]), 0U);
+    eeprom_->SetProperty(10002, Long(5));
+    instrument_.failingCommand = 5;
+    ExpectThrow<IOException>("the fake fails", [&] { eeprom_->DumpLog(); });
+    EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites.begin(), LogWrites.begin() + 6));
+    EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[8]), 5U);
+    EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[2048 + 8]), 0U);
 }
 
 /// The binary block lies right behind the log, and the table further on.
@@ -361,54 +361,54 @@ TEST_F(EepromTest, LogThatHasGrownBeyondItsAreaIsRefusedAsLongAsItIs) {
         SCOPED_TRACE(grown.size());
         Load();
         std::string reason;
-        eeprom->ReportLostLog([&](const std::string& text) { reason = text; });
-        eeprom->SetProperty(10021, Property(grown));
+        eeprom_->ReportLostLog([&](const std::string& text) { reason = text; });
+        eeprom_->SetProperty(10021, Property(grown));
         const bool fitsAnImage = 1060 + 4 * grown.size() <= 2048;
         if (fitsAnImage) {
-            EXPECT_NO_THROW(eeprom->Dump()) << "an image has a table of its own";
-            eeprom->SetProperty(10021, Property(grown));
+            EXPECT_NO_THROW(eeprom_->Dump()) << "an image has a table of its own";
+            eeprom_->SetProperty(10021, Property(grown));
         }
         ChangeLog(19);
         for (int attempt = 0; attempt < 2; ++attempt) {
-            ExpectThrow<ResourceException>(tooSmall, [&] { eeprom->DumpLog(); });
+            ExpectThrow<ResourceException>(tooSmall, [&] { eeprom_->DumpLog(); });
             ExpectThrow<ResourceException>(tooSmall, [&] { ChangeLog(1); });
-            ExpectThrow<ResourceException>(tooSmall, [&] { eeprom->Dump(); });
+            ExpectThrow<ResourceException>(tooSmall, [&] { eeprom_->Dump(); });
         }
-        EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+        EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
         if (!fitsAnImage) {
-            eeprom.reset();
+            eeprom_.reset();
             EXPECT_EQ(reason, tooSmall);
         } else {
-            eeprom->GetLog().SetItem(10021, Long(1));
-            eeprom.reset();
+            eeprom_->GetLog().SetItem(10021, Long(1));
+            eeprom_.reset();
             EXPECT_EQ(reason, "");
-            EXPECT_THAT(instrument.TakeCommands(), ElementsAreArray(LogWrites));
+            EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites));
         }
-        instrument.eeprom = FreshImage();
+        instrument_.eeprom = FreshImage();
     }
     Load();
-    eeprom->SetProperty(10000, Property(Longs{1, 2}));
-    EXPECT_NO_THROW(eeprom->DumpLog()) << "the checksum is one value again by then";
-    eeprom->SetProperty(10012, Property(Longs{}));
-    instrument.TakeCommands();
-    eeprom.reset();
-    EXPECT_EQ(instrument.TakeCommands().at(4).size, 36U) << "a shorter log is written as it is";
+    eeprom_->SetProperty(10000, Property(Longs{1, 2}));
+    EXPECT_NO_THROW(eeprom_->DumpLog()) << "the checksum is one value again by then";
+    eeprom_->SetProperty(10012, Property(Longs{}));
+    instrument_.TakeCommands();
+    eeprom_.reset();
+    EXPECT_EQ(instrument_.TakeCommands().at(4).size, 36U) << "a shorter log is written as it is";
 }
 
 /// A table may give the log more than its usual area, and then has nothing else there.
 TEST_F(EepromTest, LogThatWasReadLongerThanUsualIsWrittenAsLong) {
     for (const std::size_t end : {12U, 25U}) {  // the ends of both copies, in the table
-        std::uint8_t* const address = &instrument.eeprom[4096 + 4 + 6 * end + 2];
+        std::uint8_t* const address = &instrument_.eeprom[4096 + 4 + 6 * end + 2];
         const std::uint32_t usual = Protocol::LoadBig32(address);
         Protocol::StoreBig32(address, usual + 8);
-        std::fill_n(&instrument.eeprom[usual], 8, std::uint8_t{0});
+        std::fill_n(&instrument_.eeprom[usual], 8, std::uint8_t{0});
     }
     Load();
-    ASSERT_EQ(eeprom->GetProperty(10021).SizeOf(), 12U);
-    eeprom->DumpLog();
-    EXPECT_EQ(instrument.TakeCommands().at(9).size, 48U);
-    eeprom->SetProperty(10012, Property(Longs{1, 2}));
-    EXPECT_THAT([&] { eeprom->DumpLog(); }, testing::Throws<ResourceException>());
+    ASSERT_EQ(eeprom_->GetProperty(10021).SizeOf(), 12U);
+    eeprom_->DumpLog();
+    EXPECT_EQ(instrument_.TakeCommands().at(9).size, 48U);
+    eeprom_->SetProperty(10012, Property(Longs{1, 2}));
+    EXPECT_THAT([&] { eeprom_->DumpLog(); }, testing::Throws<ResourceException>());
 }
 
 }  // namespace

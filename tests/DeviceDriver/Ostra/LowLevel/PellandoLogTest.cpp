@@ -28,13 +28,13 @@ Property Long(std::int32_t value) {
 
 class LogTest : public testing::Test {
   protected:
-    LogTest() { table.InitializeEmtpyEAT(); }
+    LogTest() { table_.InitializeEmtpyEAT(); }
 
-    PellandoLog Read() const { return PellandoLog(table, image.begin()); }
-    void Store(std::size_t address, std::uint32_t value) { Protocol::StoreBig32(&image[address], value); }
+    PellandoLog Read() const { return PellandoLog(table_, image_.begin()); }
+    void Store(std::size_t address, std::uint32_t value) { Protocol::StoreBig32(&image_[address], value); }
 
-    PellandoEAT table;
-    Bytes image = FreshImage();
+    PellandoEAT table_;
+    Bytes image_ = FreshImage();
 };
 
 TEST_F(LogTest, ChecksumAddsIntegersAndBitPatternsModulo32Bits) {
@@ -82,7 +82,7 @@ TEST_F(LogTest, ValidCopyIsChosenMainCopyFirst) {
         Store(MainCopy + 8, 5);
         Store(SecondCopy, row.secondChecksum);
         Store(SecondCopy + 8, 6);
-        const PellandoLog log(table, image.begin());
+        const PellandoLog log(table_, image_.begin());
         EXPECT_EQ(log.GetItem(10002).AsLong(), row.expected);
         EXPECT_EQ(log.GetItem(10001).AsFloat(), row.expected == 5 ? 1.0F : 0.0F);
         EXPECT_TRUE(log.HasValidChecksum());
@@ -160,11 +160,11 @@ TEST_F(LogTest, IncrementAddsToWhatIsThere) {
 }
 
 TEST_F(LogTest, ChecksumItemMustBeThereAndHoldSomething) {
-    table.GetDatastore().GetProperty(10000).Assign(std::int32_t{4});  // now empty
+    table_.GetDatastore().GetProperty(10000).Assign(std::int32_t{4});  // now empty
     Store(SecondCopy, 6);
     Store(SecondCopy + 8, 6);
     EXPECT_EQ(Read().GetItem(10002).AsLong(), 6);
-    table.GetDatastore().GetDatastore().pop_front();
+    table_.GetDatastore().GetDatastore().pop_front();
     ExpectThrow<ResourceException>("id 10000 doesn't exist", [&] { Read(); });
 }
 

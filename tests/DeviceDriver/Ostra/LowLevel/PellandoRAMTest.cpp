@@ -33,9 +33,9 @@ Property Long(std::int32_t value) {
 class RamTest : public testing::Test {
   protected:
     RamTest() {
-        instrument.misc2 = 300;
-        instrument.describeMode = [](std::uint8_t mode) { return Answers{3, mode, 0, 130, 68, 1}; };
-        instrument.commands.clear();
+        instrument_.misc2 = 300;
+        instrument_.describeMode = [](std::uint8_t mode) { return Answers{3, mode, 0, 130, 68, 1}; };
+        instrument_.commands.clear();
     }
 
     /// A whole set for storing.
@@ -52,14 +52,14 @@ class RamTest : public testing::Test {
     }
     std::vector<std::string> CommandNames() {
         std::vector<std::string> names;
-        for (const Command& command : instrument.TakeCommands()) {
+        for (const Command& command : instrument_.TakeCommands()) {
             names.push_back(command.name);
         }
         return names;
     }
 
-    FakeInstrument instrument;
-    PellandoRAM ram{Open(instrument)};
+    FakeInstrument instrument_;
+    PellandoRAM ram_{Open(instrument_)};
 };
 
 /// The entries in their order: "2013=300 2016=0.5".
@@ -77,15 +77,15 @@ std::string Text(const Properties& set) {
 }
 
 TEST_F(RamTest, LoadsMiscValuesAndWhatFollowsFromTheSecond) {
-    instrument.misc1 = 200;
-    instrument.misc3 = 3;
-    instrument.misc4 = 65535;
-    instrument.misc5 = 5;
+    instrument_.misc1 = 200;
+    instrument_.misc3 = 3;
+    instrument_.misc4 = 65535;
+    instrument_.misc5 = 5;
     for (const int misc2 : {0, 300, 301, 65535}) {
-        instrument.misc2 = static_cast<std::uint16_t>(misc2);
+        instrument_.misc2 = static_cast<std::uint16_t>(misc2);
         Properties set;
         set.SetProperty(2013, Property());
-        EXPECT_EQ(&ram.Load(set), &set);
+        EXPECT_EQ(&ram_.Load(set), &set);
         EXPECT_THAT(CommandNames(), ElementsAre("GetMISC"));
         EXPECT_EQ(Text(set), "2013=" + std::to_string(misc2) + " 2012=200 2004=3 2006=65535 2020=5 " +
                                  (misc2 < 301 ? "2016=0.5 2017=0.012" : "2016=0.25 2017=0.005"));
@@ -93,42 +93,42 @@ TEST_F(RamTest, LoadsMiscValuesAndWhatFollowsFromTheSecond) {
 }
 
 TEST_F(RamTest, LoadsMeasurementParametersInSecondsAndFlags) {
-    instrument.p1 = 1000;
-    instrument.p2 = 10;
-    instrument.p3 = 65535;
-    instrument.p5 = 7;
+    instrument_.p1 = 1000;
+    instrument_.p2 = 10;
+    instrument_.p3 = 65535;
+    instrument_.p5 = 7;
     const std::pair<int, const char*> cases[] = {
         {0xA0, "2008=0 2000=0 2002=0 2003=0"}, {0xA1, "2008=1 2000=0 2002=0 2003=0"},
         {0xA2, "2008=0 2000=1 2002=0 2003=0"}, {0xA4, "2008=0 2000=0 2002=1 2003=0"},
         {0xA8, "2008=0 2000=0 2002=0 2003=1"}, {0x0F, "2008=1 2000=1 2002=1 2003=1"}};
     for (const auto& [flags, expected] : cases) {
-        instrument.p4 = static_cast<std::uint8_t>(flags);
+        instrument_.p4 = static_cast<std::uint8_t>(flags);
         Properties set;
         set.SetProperty(2021, Property());
-        ram.Load(set);
+        ram_.Load(set);
         EXPECT_THAT(CommandNames(), ElementsAre("GetMeasureParameters"));
         EXPECT_EQ(Text(set), std::string("2021=7 2009=0.068 2001=0.0884 2010=65535 ") + expected);
     }
-    instrument.p2 = 65535;
-    EXPECT_FLOAT_EQ(ram.Load(2001).AsFloat(), 579.3294F);
+    instrument_.p2 = 65535;
+    EXPECT_FLOAT_EQ(ram_.Load(2001).AsFloat(), 579.3294F);
 }
 
 TEST_F(RamTest, LoadAsksOnlyForWhatIsWanted) {
     Properties set;
     set.SetProperty(1000, Long(3));
     set.SetProperty(2005, Long(4));
-    ram.Load(set);
+    ram_.Load(set);
     EXPECT_EQ(set.GetItemCount(), 2U);
-    EXPECT_EQ(ram.Load(2007).AsLong(), 0);
-    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+    EXPECT_EQ(ram_.Load(2007).AsLong(), 0);
+    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
 
     Properties conditions("PhysicalConditions");
-    ram.Load(conditions);
+    ram_.Load(conditions);
     EXPECT_THAT(CommandNames(), ElementsAre("GetMISC", "GetMeasureParameters"));
     EXPECT_EQ(Text(conditions),
               "2000=0 2001=0 2002=0 2003=0 2008=0 2009=0 2010=0 2004=0 2005=-1 2006=0 2012=0 2013=300 2020=0 "
               "2011=-1 2014=-1 2015=-1 2016=0.5 2017=0.012 9189=-1 2021=0");
-    ExpectThrow<DataException>("invalid property id 9189", [&] { ram.Load(9189); });
+    ExpectThrow<DataException>("invalid property id 9189", [&] { ram_.Load(9189); });
 }
 
 TEST_F(RamTest, TemplateHoldsItsIdentifiersInOrder) {
@@ -169,10 +169,10 @@ TEST_F(RamTest, StoresTimesAsRoundedCounts) {
         Properties set = Conditions();
         set.SetProperty(2009, Property(row.integrationTime));
         set.SetProperty(2001, Property(row.secondTime));
-        ram.Store(set);
+        ram_.Store(set);
         EXPECT_THAT(CommandNames(), ElementsAre("SetMeasureParameters"));
-        EXPECT_EQ(instrument.p1, row.p1) << row.name;
-        EXPECT_EQ(instrument.p2, row.p2) << row.name;
+        EXPECT_EQ(instrument_.p1, row.p1) << row.name;
+        EXPECT_EQ(instrument_.p2, row.p2) << row.name;
     }
 }
 
@@ -205,16 +205,16 @@ TEST_F(RamTest, StoresThirdParameterAndFlags) {
         } else {
             set.SetProperty(9189, Long(row.replacement));
         }
-        ram.Store(set);
-        EXPECT_EQ(instrument.p3, row.p3);
-        EXPECT_EQ(instrument.p4, row.flags);
+        ram_.Store(set);
+        EXPECT_EQ(instrument_.p3, row.p3);
+        EXPECT_EQ(instrument_.p4, row.flags);
     }
     const std::pair<std::uint16_t, std::uint8_t> flags[] = {{2008, 1}, {2000, 2}, {2002, 4}, {2003, 8}};
     for (const auto& [id, bit] : flags) {
         Properties set = Conditions();
         set.SetProperty(id, Long(2));
-        ram.Store(set);
-        EXPECT_EQ(instrument.p4, bit) << id;
+        ram_.Store(set);
+        EXPECT_EQ(instrument_.p4, bit) << id;
     }
 }
 
@@ -224,12 +224,12 @@ TEST_F(RamTest, StoreNeedsAWholeSet) {
         Properties set = Conditions();
         set.GetDatastore().remove_if([id](const auto& entry) { return entry.first == id; });
         ExpectThrow<ResourceException>("id " + std::to_string(id) + " doesn't exist",
-                                       [&] { ram.Store(set); });
+                                       [&] { ram_.Store(set); });
     }
-    ExpectThrow<ResourceException>("id 2013 doesn't exist", [&] { ram.Store(2009, Property(0.1F)); });
-    ram.Store(2013, Long(1));
-    ram.Store(1211, Long(1));
-    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+    ExpectThrow<ResourceException>("id 2013 doesn't exist", [&] { ram_.Store(2009, Property(0.1F)); });
+    ram_.Store(2013, Long(1));
+    ram_.Store(1211, Long(1));
+    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
 }
 
 /// Three modes, the later ones with the finer time base.
@@ -247,16 +247,16 @@ Answers ThreeModes(std::uint8_t mode) {
 class ModeSearch : public RamTest {
   protected:
     ModeSearch() {
-        instrument.misc2 = 301;
-        instrument.describeMode = &ThreeModes;
-        set.SetProperty(2013, Long(301));
+        instrument_.misc2 = 301;
+        instrument_.describeMode = &ThreeModes;
+        set_.SetProperty(2013, Long(301));
     }
     void Want(double microseconds) {
-        set.SetProperty(2009, Property(static_cast<float>(microseconds / 1e6)));
+        set_.SetProperty(2009, Property(static_cast<float>(microseconds / 1e6)));
     }
     std::vector<std::uint32_t> TriedModes() {
         std::vector<std::uint32_t> modes;
-        for (const Command& command : instrument.TakeCommands()) {
+        for (const Command& command : instrument_.TakeCommands()) {
             if (command.name == "SetMeasureMode") {
                 modes.push_back(command.address);
             }
@@ -264,7 +264,7 @@ class ModeSearch : public RamTest {
         return modes;
     }
 
-    Properties set = Conditions();
+    Properties set_ = Conditions();
 };
 
 TEST_F(ModeSearch, TakesTheFirstModeThatFits) {
@@ -286,38 +286,38 @@ TEST_F(ModeSearch, TakesTheFirstModeThatFits) {
          }) {
         SCOPED_TRACE(row.name);
         Want(row.microseconds);
-        ram.Store(set);
+        ram_.Store(set_);
         EXPECT_EQ(TriedModes(), row.tried);
-        EXPECT_EQ(ram.IsInPerfectMode(), row.perfect);
-        EXPECT_EQ(instrument.p1, row.p1);
-        EXPECT_NEAR(ram.Load(2009).AsFloat(), row.microseconds / 1e6, 40e-6)
+        EXPECT_EQ(ram_.IsInPerfectMode(), row.perfect);
+        EXPECT_EQ(instrument_.p1, row.p1);
+        EXPECT_NEAR(ram_.Load(2009).AsFloat(), row.microseconds / 1e6, 40e-6)
             << "loads with the same time base";
-        instrument.TakeCommands();
+        instrument_.TakeCommands();
     }
 }
 
 TEST_F(ModeSearch, TakesTheProductOfTwoFloatsAsItIs) {
-    instrument.describeMode = [](std::uint8_t mode) {
+    instrument_.describeMode = [](std::uint8_t mode) {
         return mode == 1 ? Answers{2, 1, 0, 13, 19, 1} : Answers{2, 2, 0, 1, 1, 1};
     };
     Want(247);
-    ram.Store(set);
+    ram_.Store(set_);
     EXPECT_THAT(TriedModes(), ElementsAre(1, 2)) << "247 us as a float are less, and no fraction counts";
-    set.SetProperty(2009, Property(std::nextafter(set.GetProperty(2009).AsFloat(), 1.0F)));
-    ram.Store(set);
+    set_.SetProperty(2009, Property(std::nextafter(set_.GetProperty(2009).AsFloat(), 1.0F)));
+    ram_.Store(set_);
     EXPECT_THAT(TriedModes(), ElementsAre(1));
 }
 
 TEST_F(ModeSearch, UsesTheModesFactorForTheSecondTime) {
     Want(3000);
-    set.SetProperty(2001, Property(0.008F));
-    ram.Store(set);
-    EXPECT_EQ(instrument.p2, 4U) << "0.008 s in units of 100 times 20 us";
-    EXPECT_FLOAT_EQ(ram.Load(2001).AsFloat(), 0.008F);
-    set.SetProperty(2013, Long(300));
-    ram.Store(set);
-    EXPECT_EQ(instrument.p2, 1U) << "an instrument without modes has the time base of construction";
-    EXPECT_FALSE(ram.IsInPerfectMode());
+    set_.SetProperty(2001, Property(0.008F));
+    ram_.Store(set_);
+    EXPECT_EQ(instrument_.p2, 4U) << "0.008 s in units of 100 times 20 us";
+    EXPECT_FLOAT_EQ(ram_.Load(2001).AsFloat(), 0.008F);
+    set_.SetProperty(2013, Long(300));
+    ram_.Store(set_);
+    EXPECT_EQ(instrument_.p2, 1U) << "an instrument without modes has the time base of construction";
+    EXPECT_FALSE(ram_.IsInPerfectMode());
 }
 
 TEST_F(ModeSearch, RefusesTimesThatNoModeCanCount) {
@@ -339,25 +339,25 @@ TEST_F(ModeSearch, RefusesTimesThatNoModeCanCount) {
          }) {
         SCOPED_TRACE(row.name);
         Want(68000);
-        ram.Store(set);
-        ASSERT_TRUE(ram.IsInPerfectMode());
-        instrument.TakeCommands();
-        set.SetProperty(2009, Property(row.seconds));
-        ExpectThrow<ResourceException>(row.message, [&] { ram.Store(set); });
-        EXPECT_EQ(ram.IsInPerfectMode(), row.message == high) << "too high leaves it, too low clears it";
+        ram_.Store(set_);
+        ASSERT_TRUE(ram_.IsInPerfectMode());
+        instrument_.TakeCommands();
+        set_.SetProperty(2009, Property(row.seconds));
+        ExpectThrow<ResourceException>(row.message, [&] { ram_.Store(set_); });
+        EXPECT_EQ(ram_.IsInPerfectMode(), row.message == high) << "too high leaves it, too low clears it";
         const auto names = CommandNames();
         EXPECT_EQ(names.size(), 2 * row.rounds);
         EXPECT_THAT(names, testing::Not(testing::Contains("SetMeasureParameters")));
-        instrument.p1 = 1000;
-        EXPECT_FLOAT_EQ(ram.Load(2009).AsFloat(), 0.068F) << "the time base of construction";
-        instrument.TakeCommands();
+        instrument_.p1 = 1000;
+        EXPECT_FLOAT_EQ(ram_.Load(2009).AsFloat(), 0.068F) << "the time base of construction";
+        instrument_.TakeCommands();
     }
 }
 
 TEST_F(ModeSearch, NeedsTheTimeBeforeItTriesAMode) {
-    set.GetDatastore().remove_if([](const auto& entry) { return entry.first == 2009; });
-    ExpectThrow<ResourceException>("id 2009 doesn't exist", [&] { ram.Store(set); });
-    EXPECT_THAT(instrument.TakeCommands(), IsEmpty());
+    set_.GetDatastore().remove_if([](const auto& entry) { return entry.first == 2009; });
+    ExpectThrow<ResourceException>("id 2009 doesn't exist", [&] { ram_.Store(set_); });
+    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
 }
 
 /// One of so many modes that is too slow for most times.
@@ -379,17 +379,17 @@ TEST_F(ModeSearch, EndsWithEveryInstrument) {
              Case{"no modes", [](int mode) { return Slow(0, mode); }, 1},
          }) {
         Want(1000);
-        instrument.describeMode = row.describe;
+        instrument_.describeMode = row.describe;
         SCOPED_TRACE(row.name);
-        ExpectThrow<ResourceException>("Integration time too low", [&] { ram.Store(set); });
+        ExpectThrow<ResourceException>("Integration time too low", [&] { ram_.Store(set_); });
         EXPECT_EQ(TriedModes().size(), row.rounds);
     }
     // A time base of nothing, and a factor of nothing.
-    instrument.describeMode = [](std::uint8_t mode) { return Answers{3, mode, 0, 130, 0, 1}; };
-    ExpectThrow<ResourceException>("Integration time too high", [&] { ram.Store(set); });
-    instrument.describeMode = [](std::uint8_t mode) { return Answers{3, mode, 0, 0, 68, 1}; };
-    ram.Store(set);
-    EXPECT_EQ(instrument.p2, 0xFFFF);
+    instrument_.describeMode = [](std::uint8_t mode) { return Answers{3, mode, 0, 130, 0, 1}; };
+    ExpectThrow<ResourceException>("Integration time too high", [&] { ram_.Store(set_); });
+    instrument_.describeMode = [](std::uint8_t mode) { return Answers{3, mode, 0, 0, 68, 1}; };
+    ram_.Store(set_);
+    EXPECT_EQ(instrument_.p2, 0xFFFF);
 }
 
 }  // namespace

@@ -53,7 +53,7 @@ class ReceivedScan : public testing::TestWithParam<Transport> {
         }
     }
 
-    TestClock clock{TestTime::Virtual};
+    TestClock clock_{TestTime::Virtual};
 };
 INSTANTIATE_TEST_SUITE_P(Transports, ReceivedScan, testing::Values(Transport::Native, Transport::UsbIo),
                          [](const auto& parameter) { return std::string(Name(parameter.param)); });
@@ -89,7 +89,7 @@ TEST_P(ReceivedScan, BringsWhatWouldBeCollectedAndWhatCameBeforeAFailure) {
         {
             PellandoFunctionality instrument(nullptr, 0);
             instrument.SetScanReceiver(&receiver);
-            const Stopwatch watch(clock);
+            const Stopwatch watch(clock_);
             try {
                 instrument.StartScan(Record, 1, row.total);
             } catch (const IOException& exception) {

@@ -24,7 +24,7 @@ constexpr std::size_t ReceiveBufferSize = 8;
 /// Opens the pipe itself, and closes it at its end.
 class InterruptListener::Watch final : public InterruptWatch {
   public:
-    explicit Watch(const std::string& path) : devicePath(path) {
+    explicit Watch(const std::string& path) : devicePath_(path) {
         if (!HasEvents()) {
             throw IOException("could not create interrupt listener events", Here());
         }
@@ -50,7 +50,7 @@ class InterruptListener::Watch final : public InterruptWatch {
     void ReadUntilTheEnd() {
         std::vector<std::uint8_t> buffer(ReceiveBufferSize);
         const auto connection =
-            std::make_shared<USBConnection>(devicePath, Protocol::NativeDriver::InterruptPipe, Wake());
+            std::make_shared<USBConnection>(devicePath_, Protocol::NativeDriver::InterruptPipe, Wake());
         ExchangePipe(connection);
         ReportStart();
         for (std::uint32_t count = 1; count != 0 && !EndRequested();) {
@@ -59,16 +59,16 @@ class InterruptListener::Watch final : public InterruptWatch {
         }
     }
     std::shared_ptr<USBConnection> ExchangePipe(std::shared_ptr<USBConnection> connection) {
-        const ScopedLock held(lock);
-        return std::exchange(pipe, std::move(connection));
+        const ScopedLock held(lock_);
+        return std::exchange(pipe_, std::move(connection));
     }
 
-    const std::string devicePath;
-    std::shared_ptr<USBConnection> pipe;  ///< guarded by `lock`
+    const std::string devicePath_;
+    std::shared_ptr<USBConnection> pipe_;  ///< guarded by `lock`
 };
 
 InterruptListener::InterruptListener(const std::string& devicePath) try
-    : watch(std::make_shared<Watch>(devicePath)) {}
+    : watch_(std::make_shared<Watch>(devicePath)) {}
 TRACED
 
 InterruptListener::~InterruptListener() {
@@ -80,46 +80,46 @@ InterruptListener::~InterruptListener() {
 }
 
 void InterruptListener::SetListener(std::shared_ptr<EventListener> receiver) try {
-    watch->SetReceiver(std::move(receiver));
+    watch_->SetReceiver(std::move(receiver));
 }
 TRACED
 
 void InterruptListener::SetListener(EventListener* receiver) try {
-    watch->SetReceiver(std::shared_ptr<EventListener>(std::shared_ptr<void>(), receiver));
+    watch_->SetReceiver(std::shared_ptr<EventListener>(std::shared_ptr<void>(), receiver));
 }
 TRACED
 
-void InterruptListener::ClearListener() try { watch->SetReceiver(nullptr); }
+void InterruptListener::ClearListener() try { watch_->SetReceiver(nullptr); }
 TRACED
 
-bool InterruptListener::IsTouched() const try { return watch->IsTouched(); }
+bool InterruptListener::IsTouched() const try { return watch_->IsTouched(); }
 TRACED
 
 void InterruptListener::Start() try {
-    if (thread) {
+    if (thread_) {
         return;
     }
-    thread = watch->Launch();
-    if (!thread) {
+    thread_ = watch_->Launch();
+    if (!thread_) {
         throw IOException("could not create interrupt listener thread", Here());
     }
-    if (!watch->AwaitStart()) {
+    if (!watch_->AwaitStart()) {
         throw IOException("interrupt listener thread had timeout", Here());
     }
 }
 TRACED
 
 void InterruptListener::Stop() try {
-    if (thread) {
-        watch->End(thread);
+    if (thread_) {
+        watch_->End(thread_);
     }
 }
 TRACED
 
-void InterruptListener::Listen() try { watch->Listen(); }
+void InterruptListener::Listen() try { watch_->Listen(); }
 TRACED
 
-void InterruptListener::DispatchEvent(std::uint32_t count) try { watch->DispatchEvent(count); }
+void InterruptListener::DispatchEvent(std::uint32_t count) try { watch_->DispatchEvent(count); }
 TRACED
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

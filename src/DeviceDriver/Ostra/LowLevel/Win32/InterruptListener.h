@@ -53,8 +53,8 @@ class InterruptListener final {
   private:
     class Watch;
 
-    const std::shared_ptr<Watch> watch;
-    Platform::OwnedHandle thread;  ///< of the owner's thread only
+    const std::shared_ptr<Watch> watch_;
+    Platform::OwnedHandle thread_;  ///< of the owner's thread only
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -13,21 +13,21 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 using Platform::DeviceInterfaces;
 
 NativeDeviceList::NativeDeviceList()
-    : list(DeviceInterfaces::MakeList(Protocol::NativeDriver::InterfaceClass, true)) {}
+    : list_(DeviceInterfaces::MakeList(Protocol::NativeDriver::InterfaceClass, true)) {}
 
 NativeDeviceList::~NativeDeviceList() {
-    if (list) {
-        DeviceInterfaces::DestroyList(list);
+    if (list_) {
+        DeviceInterfaces::DestroyList(list_);
     }
 }
 
 std::string NativeDeviceList::PathAt(std::uint32_t index) const {
-    if (!list) {
+    if (!list_) {
         return {};
     }
     for (std::uint32_t member = 0; member <= index; ++member) {
         Platform::InterfaceRecord record;
-        if (DeviceInterfaces::Find(list, Protocol::NativeDriver::InterfaceClass, member, record)) {
+        if (DeviceInterfaces::Find(list_, Protocol::NativeDriver::InterfaceClass, member, record)) {
             if (member == index) {
                 return ReadPath(record);
             }
@@ -39,14 +39,14 @@ std::string NativeDeviceList::PathAt(std::uint32_t index) const {
 }
 
 std::string NativeDeviceList::ReadPath(const Platform::InterfaceRecord& record) const {
-    const std::size_t size = DeviceInterfaces::DetailSize(list, record);
+    const std::size_t size = DeviceInterfaces::DetailSize(list_, record);
     if (size <= Platform::InterfaceDetailPathOffset) {
         return {};
     }
     std::vector<std::byte> detail(size);
     std::memcpy(detail.data(), &Platform::InterfaceDetailSizeField,
                 sizeof Platform::InterfaceDetailSizeField);
-    if (!DeviceInterfaces::ReadDetail(list, record, detail)) {
+    if (!DeviceInterfaces::ReadDetail(list_, record, detail)) {
         return {};
     }
     const auto path = detail.begin() + Platform::InterfaceDetailPathOffset;

@@ -22,7 +22,7 @@ class NativeDeviceList final {
   private:
     std::string ReadPath(const Platform::InterfaceRecord& record) const;
 
-    const Platform::DeviceList list;
+    const Platform::DeviceList list_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -31,9 +31,9 @@ std::uint32_t SecondsLimit(std::uint32_t seconds) {
 
 PellandoFunctionality_PC::PellandoFunctionality_PC(Generic::EventListener* listener,
                                                    std::uint32_t deviceIndex) try
-    : device(new PellandoUSBDevice(listener, GetDeviceAddress(deviceIndex))) {
-    record.block[NativeDriver::Block::Type] = NativeDriver::TypeVendor;
-    record.block[NativeDriver::Block::Request] = static_cast<std::uint8_t>(Request::Measure);
+    : device_(new PellandoUSBDevice(listener, GetDeviceAddress(deviceIndex))) {
+    record_.block[NativeDriver::Block::Type] = NativeDriver::TypeVendor;
+    record_.block[NativeDriver::Block::Request] = static_cast<std::uint8_t>(Request::Measure);
 }
 TRACED
 
@@ -53,9 +53,9 @@ TRACED
 
 void PellandoFunctionality_PC::Transfer(Request request, std::uint8_t direction, void* data,
                                         std::uint32_t length) {
-    record.block[NativeDriver::Block::Direction] = direction;
-    record.block[NativeDriver::Block::Request] = static_cast<std::uint8_t>(request);
-    const std::uint32_t moved = device->PerformDeviceIOControl(record.block, data, length);
+    record_.block[NativeDriver::Block::Direction] = direction;
+    record_.block[NativeDriver::Block::Request] = static_cast<std::uint8_t>(request);
+    const std::uint32_t moved = device_->PerformDeviceIOControl(record_.block, data, length);
     // A driver need not say how much it sent: what an instrument is sent it takes as a whole or refuses.
     if (moved > 0 || direction == NativeDriver::DirectionIn) {
         DataStageEnded(length, moved);
@@ -63,36 +63,36 @@ void PellandoFunctionality_PC::Transfer(Request request, std::uint8_t direction,
 }
 
 void PellandoFunctionality_PC::Send(Request request, std::uint32_t length) {
-    Transfer(request, NativeDriver::DirectionOut, record.data.data(), length);
+    Transfer(request, NativeDriver::DirectionOut, record_.data.data(), length);
 }
 
 void PellandoFunctionality_PC::Receive(Request request, std::uint32_t length) {
-    Transfer(request, NativeDriver::DirectionIn, record.data.data(), length);
+    Transfer(request, NativeDriver::DirectionIn, record_.data.data(), length);
 }
 
 template <std::size_t Size>
 void PellandoFunctionality_PC::Put(std::size_t offset, const std::array<std::uint8_t, Size>& bytes) {
-    std::copy(bytes.begin(), bytes.end(), record.data.begin() + static_cast<std::ptrdiff_t>(offset));
+    std::copy(bytes.begin(), bytes.end(), record_.data.begin() + static_cast<std::ptrdiff_t>(offset));
 }
 
 template <std::size_t Size>
 void PellandoFunctionality_PC::Take(std::size_t offset, std::array<std::uint8_t, Size>& bytes) const {
-    std::copy_n(record.data.begin() + static_cast<std::ptrdiff_t>(offset), Size, bytes.begin());
+    std::copy_n(record_.data.begin() + static_cast<std::ptrdiff_t>(offset), Size, bytes.begin());
 }
 
 void PellandoFunctionality_PC::RemoveListener(Generic::EventListener* listener) try {
-    device->RemoveListener(listener);
+    device_->RemoveListener(listener);
 }
 TRACED
 
 void PellandoFunctionality_PC::StartScan(std::uint32_t recordSize, std::uint32_t timeoutSeconds,
                                          std::uint32_t total) try {
-    scanRecords.clear();
+    scanRecords_.clear();
     Send(Request::Measure, 0);
     try {
         ReadStrip(recordSize, SecondsLimit(timeoutSeconds), total);
     } catch (...) {
-        scanRecords.clear();
+        scanRecords_.clear();
         throw;
     }
 }
@@ -103,31 +103,31 @@ void PellandoFunctionality_PC::ReadStrip(std::uint32_t recordSize, std::uint32_t
     // A strip read must have its next read queued in time: its thread goes before others while it runs.
     const Platform::ScopedThreadPriority raised(Platform::HighestThreadPriority);
     if (ScanReceiver* const receiver = Receiver()) {
-        total != 0 ? device->ReadDataCountedStrip(*receiver, recordSize, timeout, total)
-                   : device->ReadDataStrip(*receiver, recordSize, timeout);
+        total != 0 ? device_->ReadDataCountedStrip(*receiver, recordSize, timeout, total)
+                   : device_->ReadDataStrip(*receiver, recordSize, timeout);
     } else if (total != 0) {
-        device->ReadDataCountedStrip(scanRecords, recordSize, timeout, total);
+        device_->ReadDataCountedStrip(scanRecords_, recordSize, timeout, total);
     } else {
-        device->ReadDataStrip(scanRecords, recordSize, timeout);
+        device_->ReadDataStrip(scanRecords_, recordSize, timeout);
     }
 }
 
 void PellandoFunctionality_PC::GetScanData(std::uint8_t* buffer, std::uint32_t* size) try {
-    if (scanRecords.empty()) {
+    if (scanRecords_.empty()) {
         *size = 0;
         return;
     }
-    const std::span<const std::uint8_t> bytes = scanRecords.front().Bytes();
+    const std::span<const std::uint8_t> bytes = scanRecords_.front().Bytes();
     *size = std::min(*size, static_cast<std::uint32_t>(bytes.size()));
     std::memcpy(buffer, bytes.data(), *size);
-    scanRecords.pop_front();
+    scanRecords_.pop_front();
 }
 TRACED
 
 void PellandoFunctionality_PC::MeasureRequest(std::uint8_t* buffer, std::uint32_t length,
                                               std::uint32_t timeoutSeconds) try {
     Send(Request::Measure, 0);
-    device->ReadData(buffer, length, SecondsLimit(timeoutSeconds));
+    device_->ReadData(buffer, length, SecondsLimit(timeoutSeconds));
 }
 TRACED
 
@@ -136,7 +136,7 @@ void PellandoFunctionality_PC::SetMeasureParameters(const Bytes2& p1, const Byte
     Put(0, p1);
     Put(2, p2);
     Put(4, p3);
-    record.data[6] = p4;
+    record_.data[6] = p4;
     Send(Request::SetMeasureParameters, 8);
 }
 TRACED
@@ -147,13 +147,13 @@ void PellandoFunctionality_PC::GetMeasureParameters(Bytes2& p1, Bytes2& p2, Byte
     Take(0, p1);
     Take(2, p2);
     Take(4, p3);
-    p4 = record.data[6];
-    p5 = record.data[7];
+    p4 = record_.data[6];
+    p5 = record_.data[7];
 }
 TRACED
 
 void PellandoFunctionality_PC::SetMeasureMode(std::uint8_t mode) try {
-    record.data[0] = mode;
+    record_.data[0] = mode;
     Send(Request::SetMeasureMode, 1);
 }
 TRACED
@@ -161,12 +161,12 @@ TRACED
 void PellandoFunctionality_PC::GetMeasureMode(std::uint8_t& m1, std::uint8_t& m2, std::uint8_t& m3,
                                               std::uint8_t& m4, std::uint8_t& m5, std::uint8_t& m6) try {
     Receive(Request::GetMeasureMode, 6);
-    m1 = record.data[0];
-    m2 = record.data[1];
-    m3 = record.data[2];
-    m4 = record.data[3];
-    m5 = record.data[4];
-    m6 = record.data[5];
+    m1 = record_.data[0];
+    m2 = record_.data[1];
+    m3 = record_.data[2];
+    m4 = record_.data[3];
+    m5 = record_.data[4];
+    m6 = record_.data[5];
 }
 TRACED
 
@@ -181,10 +181,10 @@ void PellandoFunctionality_PC::WriteEEPROM(Request request, const Bytes4& addres
     Put(0, address);
     Put(4, length);
     Send(request, 8);
-    device->WriteData(data, count, WaitLimit(std::uint64_t{count} * 10));
+    device_->WriteData(data, count, WaitLimit(std::uint64_t{count} * 10));
     const std::uint8_t end = 0x00;
-    device->WriteData(&end, sizeof end, 0);
-    device->WriteData(&end, sizeof end, 0);
+    device_->WriteData(&end, sizeof end, 0);
+    device_->WriteData(&end, sizeof end, 0);
 }
 TRACED
 
@@ -193,7 +193,7 @@ void PellandoFunctionality_PC::ReadEEPROM(const Bytes4& address, const Bytes2& l
     Put(0, address);
     Put(4, length);
     Send(Request::ReadEeprom, 8);
-    device->ReadData(data, count, WaitLimit(count));
+    device_->ReadData(data, count, WaitLimit(count));
 }
 TRACED
 
@@ -213,7 +213,7 @@ TRACED
 
 void PellandoFunctionality_PC::DownloadRAMFirmware(std::uint16_t address, const std::uint8_t* image,
                                                    std::uint32_t count) try {
-    Protocol::StoreLittle16(&record.block[NativeDriver::Block::Value], address);
+    Protocol::StoreLittle16(&record_.block[NativeDriver::Block::Value], address);
     // The driver only reads the data of a request in this direction.
     Transfer(Request::DownloadRamFirmware, NativeDriver::DirectionOut, const_cast<std::uint8_t*>(image),
              count);
@@ -232,8 +232,8 @@ void PellandoFunctionality_PC::GetMISC(std::uint8_t& m1, Bytes2& m2, std::uint8_
     Take(0, m2);
     Take(2, m4);
     Take(4, m5);
-    m1 = record.data[6];
-    m3 = record.data[7];
+    m1 = record_.data[6];
+    m3 = record_.data[7];
 }
 TRACED
 
@@ -244,14 +244,14 @@ TRACED
 
 void PellandoFunctionality_PC::Reset(const Bytes2& code) try {
     // The code's low byte; the second byte of the data area gets it as well and is not sent.
-    record.data[0] = code[1];
-    record.data[1] = code[1];
+    record_.data[0] = code[1];
+    record_.data[1] = code[1];
     Send(Request::Reset, 1);
 }
 TRACED
 
 void PellandoFunctionality_PC::GetDeviceIdentifier(std::string& identifier) try {
-    identifier = device->GetAddress();
+    identifier = device_->GetAddress();
 }
 TRACED
 

@@ -86,9 +86,9 @@ class PellandoFunctionality_PC final : public PellandoFunctionalityByte {
     template <std::size_t Size>
     void Take(std::size_t offset, std::array<std::uint8_t, Size>& bytes) const;
 
-    CommandRecord record;
-    ScanRecordList scanRecords;
-    const Varnholt::Utilities::Tools::SmartPointer<PellandoUSBDevice> device;
+    CommandRecord record_;
+    ScanRecordList scanRecords_;
+    const Varnholt::Utilities::Tools::SmartPointer<PellandoUSBDevice> device_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

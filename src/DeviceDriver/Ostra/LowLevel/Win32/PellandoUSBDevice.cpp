@@ -63,17 +63,17 @@ std::uint32_t ChunkSize(std::uint32_t recordSize, const SourceLocation& caller =
 /// Collects the whole records of each transfer; of one that fails, none.
 class RecordCollector final : public ScanReceiver {
   public:
-    RecordCollector(ScanRecordList& list, std::size_t size) : records(list), recordSize(size) {}
+    RecordCollector(ScanRecordList& list, std::size_t size) : records_(list), recordSize_(size) {}
 
     void Receive(std::span<const std::uint8_t> data) override {
-        for (; data.size() >= recordSize; data = data.subspan(recordSize)) {
-            records.emplace_back(data.first(recordSize));
+        for (; data.size() >= recordSize_; data = data.subspan(recordSize_)) {
+            records_.emplace_back(data.first(recordSize_));
         }
     }
 
   private:
-    ScanRecordList& records;
-    const std::size_t recordSize;
+    ScanRecordList& records_;
+    const std::size_t recordSize_;
 };
 
 }  // namespace
@@ -127,12 +127,13 @@ class PellandoUSBDevice::Core final : public EventListener {
 };
 
 PellandoUSBDevice::PellandoUSBDevice(EventListener* listener, const std::string& devicePath) try
-    : core(std::make_shared<Core>(listener, devicePath)), interruptListener(devicePath) {
+    : core_(std::make_shared<Core>(listener, devicePath)), interruptListener_(devicePath) {
     try {
-        const ScopedLock held(core->lock);
+        const ScopedLock held(core_->lock);
         SetupInterruptListener();
     } catch (...) {
-        core->isClosed = true;  // a message may be on its way to the listener of an owner that gets no device
+        core_->isClosed =
+            true;  // a message may be on its way to the listener of an owner that gets no device
         throw;
     }
 }
@@ -143,27 +144,27 @@ PellandoUSBDevice::~PellandoUSBDevice() {
         Shutdown();
     } catch (...) {  // the listener's own end stops its thread
     }
-    core->isClosed = true;
-    core->ClosePipes();
+    core_->isClosed = true;
+    core_->ClosePipes();
 }
 
 void PellandoUSBDevice::SetupInterruptListener() try {
-    interruptListener.SetListener(core);
-    interruptListener.Start();
+    interruptListener_.SetListener(core_);
+    interruptListener_.Start();
 }
 TRACED
 
 void PellandoUSBDevice::Shutdown() try {
-    core->isClosing = true;
+    core_->isClosing = true;
     HandleUntouchedButton();
-    interruptListener.Stop();
+    interruptListener_.Stop();
 }
 TRACED
 
 /// Without the device lock, which somebody may hold for the length of a scan. Failures do not matter: the
 /// instrument may be gone.
 void PellandoUSBDevice::HandleUntouchedButton() try {
-    if (interruptListener.IsTouched()) {
+    if (interruptListener_.IsTouched()) {
         return;
     }
     const NativeDriver::ControlBlock abortPipe = MakeBlock(0, 0, Protocol::InterruptInEndpoint);
@@ -171,44 +172,44 @@ void PellandoUSBDevice::HandleUntouchedButton() try {
         MakeBlock(NativeDriver::TypeVendor, static_cast<std::uint8_t>(Protocol::Request::ButtonReport), 3);
     std::array<std::uint8_t, 8> data{};
     const auto length = static_cast<std::uint32_t>(data.size());
-    const Platform::CriticalSection::Holder open(core->closingLock);
-    core->control.PerformDeviceIOControl(abortPipe, NativeDriver::ControlAbortPipe, data.data(), length,
-                                         false);
-    core->control.PerformDeviceIOControl(buttonReport, NativeDriver::ControlButtonReport, data.data(), length,
-                                         false);
+    const Platform::CriticalSection::Holder open(core_->closingLock);
+    core_->control.PerformDeviceIOControl(abortPipe, NativeDriver::ControlAbortPipe, data.data(), length,
+                                          false);
+    core_->control.PerformDeviceIOControl(buttonReport, NativeDriver::ControlButtonReport, data.data(),
+                                          length, false);
 }
 TRACED
 
 void PellandoUSBDevice::RemoveListener(EventListener*) try {
-    const ScopedLock held(core->lock);
-    core->listener = nullptr;
-    interruptListener.ClearListener();
+    const ScopedLock held(core_->lock);
+    core_->listener = nullptr;
+    interruptListener_.ClearListener();
 }
 TRACED
 
 void PellandoUSBDevice::MessageFromDevice(std::uint32_t code, std::uint32_t parameter) try {
-    const std::shared_ptr<Core> alive = core;  // the message may close the device
+    const std::shared_ptr<Core> alive = core_;  // the message may close the device
     alive->MessageFromDevice(code, parameter);
 }
 TRACED
 
 std::uint32_t PellandoUSBDevice::PerformDeviceIOControl(const NativeDriver::ControlBlock& block, void* data,
                                                         std::uint32_t length) try {
-    const ScopedLock held(core->lock);
-    return core->control.PerformDeviceIOControl(block, NativeDriver::ControlVendorRequest, data, length,
-                                                true);
+    const ScopedLock held(core_->lock);
+    return core_->control.PerformDeviceIOControl(block, NativeDriver::ControlVendorRequest, data, length,
+                                                 true);
 }
 TRACED
 
 void PellandoUSBDevice::ReadData(void* buffer, std::uint32_t length, std::uint32_t timeout) try {
-    const ScopedLock held(core->lock);
-    core->read.Read(buffer, length, timeout);
+    const ScopedLock held(core_->lock);
+    core_->read.Read(buffer, length, timeout);
 }
 TRACED
 
 void PellandoUSBDevice::WriteData(const void* buffer, std::uint32_t length, std::uint32_t timeout) try {
-    const ScopedLock held(core->lock);
-    core->write.Write(buffer, length, timeout);
+    const ScopedLock held(core_->lock);
+    core_->write.Write(buffer, length, timeout);
 }
 TRACED
 
@@ -227,10 +228,10 @@ TRACED
 
 void PellandoUSBDevice::ReadStrip(ScanReceiver& receiver, PartialData partialData, std::uint32_t recordSize,
                                   std::uint32_t timeout) {
-    const ScopedLock held(core->lock);
+    const ScopedLock held(core_->lock);
     const std::uint32_t chunk = ChunkSize(recordSize);
     const std::uint32_t limit = WaitLimit(timeout, ScanGrace);
-    StripReader reader(core->read, chunk);
+    StripReader reader(core_->read, chunk);
     reader.Start(RecordsOfFirstRead * recordSize);
     reader.Advance();
     bool isFirst = true;
@@ -276,7 +277,7 @@ TRACED
 void PellandoUSBDevice::ReadCountedStrip(ScanReceiver& receiver, PartialData partialData,
                                          std::uint32_t recordSize, std::uint32_t timeout,
                                          std::uint32_t total) {
-    const ScopedLock held(core->lock);
+    const ScopedLock held(core_->lock);
     const std::uint32_t chunk = ChunkSize(recordSize);
     const std::uint32_t limit = WaitLimit(timeout, ScanGrace);
     std::uint32_t remaining = total;
@@ -285,7 +286,7 @@ void PellandoUSBDevice::ReadCountedStrip(ScanReceiver& receiver, PartialData par
         remaining -= size;
         return size;
     };
-    StripReader reader(core->read, chunk);
+    StripReader reader(core_->read, chunk);
     std::uint32_t current = takeNext();
     if (current > 0) {
         reader.Start(current);
@@ -335,7 +336,7 @@ void PellandoUSBDevice::HandOverPartialData(StripReader& reader, ScanReceiver& r
 }
 
 const std::string& PellandoUSBDevice::GetAddress() const {
-    return core->path;
+    return core_->path;
 }
 
 std::vector<std::string> PellandoUSBDevice::GetAllDevices() try {

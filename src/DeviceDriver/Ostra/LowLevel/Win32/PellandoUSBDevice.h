@@ -90,8 +90,8 @@ class PellandoUSBDevice final : public Generic::EventListener {
                           std::uint32_t timeout, std::uint32_t total);
     static void HandOverPartialData(StripReader& reader, ScanReceiver& receiver, PartialData partialData);
 
-    const std::shared_ptr<Core> core;  ///< with the listener's thread, while that delivers a message
-    InterruptListener interruptListener;
+    const std::shared_ptr<Core> core_;  ///< with the listener's thread, while that delivers a message
+    InterruptListener interruptListener_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -13,15 +13,15 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 class ScanRecord final {
   public:
     explicit ScanRecord(std::span<const std::uint8_t> content)
-        : bytes(std::make_unique_for_overwrite<std::uint8_t[]>(content.size())), size(content.size()) {
-        std::memcpy(bytes.get(), content.data(), size);
+        : bytes_(std::make_unique_for_overwrite<std::uint8_t[]>(content.size())), size_(content.size()) {
+        std::memcpy(bytes_.get(), content.data(), size_);
     }
 
-    std::span<const std::uint8_t> Bytes() const { return {bytes.get(), size}; }
+    std::span<const std::uint8_t> Bytes() const { return {bytes_.get(), size_}; }
 
   private:
-    std::unique_ptr<std::uint8_t[]> bytes;
-    std::size_t size;
+    std::unique_ptr<std::uint8_t[]> bytes_;
+    std::size_t size_;
 };
 
 /// In the order in which the instrument sent them; taken from the front.

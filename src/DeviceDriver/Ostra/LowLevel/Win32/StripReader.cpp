@@ -13,14 +13,14 @@ StripReader::PendingRead::PendingRead(Platform::Handle event, std::uint32_t chun
     : buffer(std::make_unique_for_overwrite<std::uint8_t[]>(chunk)), request(event) {}
 
 StripReader::StripReader(const USBConnection& connection, std::uint32_t chunk)
-    : pipe(connection.PipeHandle()),
-      arrived(std::make_unique_for_overwrite<std::uint8_t[]>(chunk)),
-      first(connection.CompletionEvent(), chunk),
-      second(connection.CompletionEvent(), chunk) {}
+    : pipe_(connection.PipeHandle()),
+      arrived_(std::make_unique_for_overwrite<std::uint8_t[]>(chunk)),
+      first_(connection.CompletionEvent(), chunk),
+      second_(connection.CompletionEvent(), chunk) {}
 
 void StripReader::Start(std::uint32_t size) {
-    following->asked = size;
-    following->request.StartRead(pipe, following->buffer.get(), size);
+    following_->asked = size;
+    following_->request.StartRead(pipe_, following_->buffer.get(), size);
 }
 
 /// Both reads complete through the connection's one auto-reset event, so that a signal says only that some
@@ -35,7 +35,7 @@ WaitResult StripReader::Await(std::uint32_t limit) {
         if (FetchResult()) {
             return WaitResult::Signalled;
         }
-        const WaitResult waited = Platform::Wait(waiting->request.CompletionEvent(), remaining);
+        const WaitResult waited = Platform::Wait(waiting_->request.CompletionEvent(), remaining);
         const std::uint32_t elapsed = Platform::TickCount() - start;
         if (waited != WaitResult::Signalled || elapsed >= limit) {
             FetchResult();
@@ -47,24 +47,24 @@ WaitResult StripReader::Await(std::uint32_t limit) {
 
 /// False while the read runs.
 bool StripReader::FetchResult() {
-    succeeded = waiting->request.GetResult(count);
-    failure = succeeded ? Platform::Errors::Success : Platform::LastError();
-    return !waiting->request.IsRunning();
+    succeeded_ = waiting_->request.GetResult(count_);
+    failure_ = succeeded_ ? Platform::Errors::Success : Platform::LastError();
+    return !waiting_->request.IsRunning();
 }
 
 std::span<const std::uint8_t> StripReader::EndAndTake() {
-    if (waiting->request.IsRunning()) {
-        count = waiting->request.CancelAndWait();
+    if (waiting_->request.IsRunning()) {
+        count_ = waiting_->request.CancelAndWait();
     }
-    return {waiting->buffer.get(), std::min(count, waiting->asked)};
+    return {waiting_->buffer.get(), std::min(count_, waiting_->asked)};
 }
 
 void StripReader::Advance() {
-    std::swap(arrived, waiting->buffer);
-    arrivedCount = succeeded ? count : 0;
-    std::swap(waiting, following);
-    succeeded = false;
-    count = 0;
+    std::swap(arrived_, waiting_->buffer);
+    arrivedCount_ = succeeded_ ? count_ : 0;
+    std::swap(waiting_, following_);
+    succeeded_ = false;
+    count_ = 0;
 }
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

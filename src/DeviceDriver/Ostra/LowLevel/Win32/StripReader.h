@@ -35,17 +35,17 @@ class StripReader final {
     Platform::WaitResult Await(std::uint32_t limit);
 
     /// The outcome of the read that `Await` waited for; not successful also when it still runs.
-    bool HasSucceeded() const { return succeeded; }
+    bool HasSucceeded() const { return succeeded_; }
     /// Why not: `Errors::IoIncomplete` when it still ran.
-    Platform::ErrorCode FailureCode() const { return failure; }
-    std::uint32_t Count() const { return count; }
-    std::uint32_t SizeAsked() const { return waiting->asked; }
+    Platform::ErrorCode FailureCode() const { return failure_; }
+    std::uint32_t Count() const { return count_; }
+    std::uint32_t SizeAsked() const { return waiting_->asked; }
 
     /// Makes the data of the read that was waited for the arrived data, and the read behind it the one to
     /// wait for.
     void Advance();
 
-    std::span<const std::uint8_t> Arrived() const { return {arrived.get(), arrivedCount}; }
+    std::span<const std::uint8_t> Arrived() const { return {arrived_.get(), arrivedCount_}; }
 
     /// Ends the read that was waited for, if it still runs, and gives what it has brought. For a read that
     /// failed; nothing can be started afterwards.
@@ -63,16 +63,16 @@ class StripReader final {
 
     bool FetchResult();
 
-    const Platform::Handle pipe;
-    Buffer arrived;
-    std::uint32_t arrivedCount = 0;
-    PendingRead first;
-    PendingRead second;
-    PendingRead* waiting = &first;
-    PendingRead* following = &second;
-    bool succeeded = false;
-    Platform::ErrorCode failure = Platform::Errors::Success;
-    std::uint32_t count = 0;
+    const Platform::Handle pipe_;
+    Buffer arrived_;
+    std::uint32_t arrivedCount_ = 0;
+    PendingRead first_;
+    PendingRead second_;
+    PendingRead* waiting_ = &first_;
+    PendingRead* following_ = &second_;
+    bool succeeded_ = false;
+    Platform::ErrorCode failure_ = Platform::Errors::Success;
+    std::uint32_t count_ = 0;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -29,7 +29,7 @@ std::string TextOf(Platform::ErrorCode code) {
 }  // namespace
 
 USBConnection::USBConnection(const std::string& path, std::uint32_t pipe, Platform::Handle event) try
-    : pipeNumber(pipe), devicePath(path) {
+    : pipeNumber_(pipe), devicePath_(path) {
     OpenConnection(event);
 }
 TRACED
@@ -40,16 +40,16 @@ USBConnection::~USBConnection() {
 
 void USBConnection::OpenConnection(Platform::Handle event) try {
     Close();
-    sharedEvent = event == Platform::InvalidHandle() ? NoHandle : event;
-    const std::string suffix = pipeNumber == Protocol::NativeDriver::ControlPipe
+    sharedEvent_ = event == Platform::InvalidHandle() ? NoHandle : event;
+    const std::string suffix = pipeNumber_ == Protocol::NativeDriver::ControlPipe
                                    ? std::string()
-                                   : Protocol::NativeDriver::PipeSuffix + std::to_string(pipeNumber);
-    pipeHandle = OpenPipe(devicePath + suffix);
-    if (sharedEvent != NoHandle) {
+                                   : Protocol::NativeDriver::PipeSuffix + std::to_string(pipeNumber_);
+    pipeHandle_ = OpenPipe(devicePath_ + suffix);
+    if (sharedEvent_ != NoHandle) {
         return;
     }
-    ownEvent = Platform::MakeAutoResetEvent();
-    if (ownEvent == NoHandle) {
+    ownEvent_ = Platform::MakeAutoResetEvent();
+    if (ownEvent_ == NoHandle) {
         Close();
         throw IOException("could not create pipe-event-handle", Here());
     }
@@ -68,10 +68,10 @@ TRACED
 
 void USBConnection::Close() noexcept {
     // The pipe first: a transfer that this ends still signals the event.
-    if (const Platform::Handle file = pipeHandle.exchange(NoHandle); file != NoHandle) {
+    if (const Platform::Handle file = pipeHandle_.exchange(NoHandle); file != NoHandle) {
         Platform::DeviceFiles().CloseFile(file);
     }
-    if (const Platform::Handle event = ownEvent.exchange(NoHandle); event != NoHandle) {
+    if (const Platform::Handle event = ownEvent_.exchange(NoHandle); event != NoHandle) {
         Platform::Close(event);
     }
 }
@@ -81,7 +81,7 @@ std::uint32_t USBConnection::PerformDeviceIOControl(const Protocol::NativeDriver
                                                     bool reportFailures) try {
     Platform::SleepMilliseconds(1);
     OverlappedRequest request(CompletionEvent());
-    request.StartControl(pipeHandle, code, block.data(), static_cast<std::uint32_t>(block.size()), data,
+    request.StartControl(pipeHandle_, code, block.data(), static_cast<std::uint32_t>(block.size()), data,
                          length);
     const WaitResult waited = Platform::Wait(request.CompletionEvent(), ControlWaitLimit);
     if (!reportFailures) {
@@ -102,14 +102,14 @@ TRACED
 
 void USBConnection::Read(void* buffer, std::uint32_t length, std::uint32_t timeout) try {
     OverlappedRequest request(CompletionEvent());
-    request.StartRead(pipeHandle, buffer, length);
+    request.StartRead(pipeHandle_, buffer, length);
     CompleteOverlappedIO(request, length, timeout, "read");
 }
 TRACED
 
 void USBConnection::Write(const void* buffer, std::uint32_t length, std::uint32_t timeout) try {
     OverlappedRequest request(CompletionEvent());
-    request.StartWrite(pipeHandle, buffer, length);
+    request.StartWrite(pipeHandle_, buffer, length);
     CompleteOverlappedIO(request, length, timeout, "write");
 }
 TRACED
@@ -117,7 +117,7 @@ TRACED
 std::uint32_t USBConnection::Read(std::vector<std::uint8_t>& buffer,
                                   const std::atomic<bool>& endRequested) try {
     OverlappedRequest request(CompletionEvent());
-    request.StartRead(pipeHandle, buffer.data(), static_cast<std::uint32_t>(buffer.size()));
+    request.StartRead(pipeHandle_, buffer.data(), static_cast<std::uint32_t>(buffer.size()));
     if (!request.IsRunning()) {
         return 0;  // nothing would ever end the wait: not only when the access was denied
     }

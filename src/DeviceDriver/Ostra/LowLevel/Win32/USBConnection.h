@@ -53,8 +53,10 @@ class USBConnection final {
     std::uint32_t Read(std::vector<std::uint8_t>& buffer, const std::atomic<bool>& endRequested);
 
     /// What a caller needs that keeps several requests outstanding on the pipe.
-    Platform::Handle PipeHandle() const noexcept { return pipeHandle; }
-    Platform::Handle CompletionEvent() const noexcept { return sharedEvent ? sharedEvent : ownEvent.load(); }
+    Platform::Handle PipeHandle() const noexcept { return pipeHandle_; }
+    Platform::Handle CompletionEvent() const noexcept {
+        return sharedEvent_ ? sharedEvent_ : ownEvent_.load();
+    }
 
     // The parts of the above.
 
@@ -69,12 +71,12 @@ class USBConnection final {
     static std::string GetErrorText();
 
   private:
-    const std::uint32_t pipeNumber;
-    Platform::Handle sharedEvent = Platform::NoHandle;
+    const std::uint32_t pipeNumber_;
+    Platform::Handle sharedEvent_ = Platform::NoHandle;
     // Atomic because `Close` may come from another thread; whoever takes a handle out closes it.
-    std::atomic<Platform::Handle> pipeHandle = Platform::NoHandle;
-    std::atomic<Platform::Handle> ownEvent = Platform::NoHandle;
-    const std::string devicePath;
+    std::atomic<Platform::Handle> pipeHandle_ = Platform::NoHandle;
+    std::atomic<Platform::Handle> ownEvent_ = Platform::NoHandle;
+    const std::string devicePath_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -39,31 +39,31 @@ void KeepForever(const SmartPointer<CUsbIoPipe>& pipe) {
 class InterruptListener_Win64::Watch final : public InterruptWatch {
   public:
     /// Before the thread starts.
-    void SetPipe(CUsbIoPipe* boundPipe) { pipe = boundPipe; }
+    void SetPipe(CUsbIoPipe* boundPipe) { pipe_ = boundPipe; }
 
     /// Not owned.
     void SetReceiver(EventListener* receiver) {
         if (WasEndedByForce()) {
             return;  // no message can be under way, and nobody may be left to free the lock
         }
-        const ScopedLock delivering(deliveryLock);
+        const ScopedLock delivering(deliveryLock_);
         InterruptWatch::SetReceiver(std::shared_ptr<EventListener>(std::shared_ptr<void>(), receiver));
     }
 
     void Listen() override;
     void Deliver(std::uint32_t count) {
-        const ScopedLock delivering(deliveryLock);
+        const ScopedLock delivering(deliveryLock_);
         DispatchEvent(count);
     }
 
   private:
     enum class Outcome { Nothing, Data, Failed };
 
-    void ClosePipe() override { pipe->Close(); }
+    void ClosePipe() override { pipe_->Close(); }
     Outcome Read(std::uint32_t limit);
 
-    Mutex deliveryLock{""};
-    CUsbIoPipe* pipe = nullptr;
+    Mutex deliveryLock_{""};
+    CUsbIoPipe* pipe_ = nullptr;
 };
 
 void InterruptListener_Win64::Watch::Listen() {
@@ -83,7 +83,7 @@ void InterruptListener_Win64::Watch::Listen() {
 InterruptListener_Win64::Watch::Outcome InterruptListener_Win64::Watch::Read(std::uint32_t limit) {
     std::uint8_t data = 0;
     std::uint32_t size = sizeof(data);
-    const std::uint32_t status = pipe->ReadSyncUntil(&data, size, limit, Wake());
+    const std::uint32_t status = pipe_->ReadSyncUntil(&data, size, limit, Wake());
     // A read that was given up can have moved its byte all the same, and the button is not pressed twice.
     if (status == Status::Success || size > 0) {
         return Outcome::Data;
@@ -91,7 +91,8 @@ InterruptListener_Win64::Watch::Outcome InterruptListener_Win64::Watch::Read(std
     return status == Status::TimedOut || status == Status::UserEvent ? Outcome::Nothing : Outcome::Failed;
 }
 
-InterruptListener_Win64::InterruptListener_Win64(const std::string&) try : watch(std::make_shared<Watch>()) {}
+InterruptListener_Win64::InterruptListener_Win64(const std::string&) try
+    : watch_(std::make_shared<Watch>()) {}
 TRACED
 
 InterruptListener_Win64::~InterruptListener_Win64() {
@@ -101,47 +102,47 @@ InterruptListener_Win64::~InterruptListener_Win64() {
     }
 }
 
-void InterruptListener_Win64::SetListener(EventListener* receiver) try { watch->SetReceiver(receiver); }
+void InterruptListener_Win64::SetListener(EventListener* receiver) try { watch_->SetReceiver(receiver); }
 TRACED
 
-void InterruptListener_Win64::ClearListener() try { watch->SetReceiver(nullptr); }
+void InterruptListener_Win64::ClearListener() try { watch_->SetReceiver(nullptr); }
 TRACED
 
-void InterruptListener_Win64::SetPipe(const SmartPointer<CUsbIoPipe>& boundPipe) try { pipe = boundPipe; }
+void InterruptListener_Win64::SetPipe(const SmartPointer<CUsbIoPipe>& boundPipe) try { pipe_ = boundPipe; }
 TRACED
 
-bool InterruptListener_Win64::IsTouched() const try { return watch->IsTouched(); }
+bool InterruptListener_Win64::IsTouched() const try { return watch_->IsTouched(); }
 TRACED
 
 void InterruptListener_Win64::Start() try {
-    if (thread) {
+    if (thread_) {
         return;
     }
-    watch->SetPipe(&*pipe);
-    thread = watch->Launch();
-    if (!thread) {
+    watch_->SetPipe(&*pipe_);
+    thread_ = watch_->Launch();
+    if (!thread_) {
         throw IOException("could not create interrupt listener thread", Here());
     }
-    if (!watch->AwaitStart()) {
+    if (!watch_->AwaitStart()) {
         throw IOException("interrupt listener thread had timeout", Here());
     }
 }
 TRACED
 
 void InterruptListener_Win64::Stop() try {
-    if (thread && !watch->End(thread)) {
-        KeepForever(pipe);
+    if (thread_ && !watch_->End(thread_)) {
+        KeepForever(pipe_);
     }
 }
 TRACED
 
 void InterruptListener_Win64::Listen() try {
-    watch->SetPipe(&*pipe);
-    watch->Listen();
+    watch_->SetPipe(&*pipe_);
+    watch_->Listen();
 }
 TRACED
 
-void InterruptListener_Win64::DispatchEvent(std::uint32_t count) try { watch->Deliver(count); }
+void InterruptListener_Win64::DispatchEvent(std::uint32_t count) try { watch_->Deliver(count); }
 TRACED
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -56,9 +56,9 @@ class InterruptListener_Win64 final {
   private:
     class Watch;
 
-    const std::shared_ptr<Watch> watch;
-    Platform::OwnedHandle thread;  ///< of the owner's thread only
-    Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe> pipe;
+    const std::shared_ptr<Watch> watch_;
+    Platform::OwnedHandle thread_;  ///< of the owner's thread only
+    Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe> pipe_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

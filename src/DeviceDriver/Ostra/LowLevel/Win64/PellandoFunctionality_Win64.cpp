@@ -80,12 +80,15 @@ void Take(const std::vector<std::uint8_t>& data, std::size_t offset, std::array<
 
 PellandoFunctionality_Win64::PellandoFunctionality_Win64(Generic::EventListener* listener,
                                                          std::uint32_t deviceIndex) try
-    : device(new CUsbIo), writePipe(new CUsbIoPipe), readPipe(new CUsbIoPipe), interruptPipe(new CUsbIoPipe) {
+    : device_(new CUsbIo),
+      writePipe_(new CUsbIoPipe),
+      readPipe_(new CUsbIoPipe),
+      interruptPipe_(new CUsbIoPipe) {
     InitUSBIO(deviceIndex);
-    interruptListener = SmartPointer<InterruptListener_Win64>(new InterruptListener_Win64(devicePath));
-    interruptListener->SetPipe(interruptPipe);
-    interruptListener->SetListener(listener);
-    interruptListener->Start();
+    interruptListener_ = SmartPointer<InterruptListener_Win64>(new InterruptListener_Win64(devicePath_));
+    interruptListener_->SetPipe(interruptPipe_);
+    interruptListener_->SetListener(listener);
+    interruptListener_->Start();
 }
 TRACED
 
@@ -102,34 +105,34 @@ void PellandoFunctionality_Win64::InitUSBIO(std::uint32_t deviceIndex) try {
         throw IOException("Unable to create device list.", Here());
     }
     for (int number = 0; number < MaximumDevices; ++number) {
-        if (device->Open(number, list.Get(), &InterfaceClass) != Status::Success) {
+        if (device_->Open(number, list.Get(), &InterfaceClass) != Status::Success) {
             break;
         }
-        if (device->GetDevicePathName() == wanted) {
-            devicePath = wanted;
+        if (device_->GetDevicePathName() == wanted) {
+            devicePath_ = wanted;
             Configure(number, list.Get());
             return;
         }
-        device->Close();
+        device_->Close();
     }
     throw IOException("requested device not found", Here(), Platform::Errors::FileNotFound);
 }
 TRACED
 
 void PellandoFunctionality_Win64::Configure(int deviceNumber, Platform::DeviceList list) {
-    ThrowIfUsbIoError(device->UnconfigureDevice(), "UnconfigureDevice");
+    ThrowIfUsbIoError(device_->UnconfigureDevice(), "UnconfigureDevice");
     const std::array<UsbIo::InterfaceSetting, 1> interfaces{{{0, 0, MaximumTransferSize}}};
-    ThrowIfUsbIoError(device->SetConfiguration({0, interfaces}), "SetConfiguration");
+    ThrowIfUsbIoError(device_->SetConfiguration({0, interfaces}), "SetConfiguration");
     UsbIo::DeviceParameters parameters;
-    ThrowIfUsbIoError(device->GetDeviceParameters(parameters), "GetDeviceParameters");
+    ThrowIfUsbIoError(device_->GetDeviceParameters(parameters), "GetDeviceParameters");
     parameters.words[1] = 0;
-    ThrowIfUsbIoError(device->SetDeviceParameters(parameters), "SetDeviceParameters");
+    ThrowIfUsbIoError(device_->SetDeviceParameters(parameters), "SetDeviceParameters");
     const auto bind = [&](CUsbIoPipe& pipe, std::uint8_t endpoint, const char* operation) {
         ThrowIfUsbIoError(pipe.Bind(deviceNumber, endpoint, list, &InterfaceClass), operation);
     };
-    bind(*writePipe, Protocol::BulkOutEndpoint, "BindTX");
-    bind(*readPipe, Protocol::BulkInEndpoint, "BindRX");
-    bind(*interruptPipe, Protocol::InterruptInEndpoint, "BindIR");
+    bind(*writePipe_, Protocol::BulkOutEndpoint, "BindTX");
+    bind(*readPipe_, Protocol::BulkInEndpoint, "BindRX");
+    bind(*interruptPipe_, Protocol::InterruptInEndpoint, "BindIR");
 }
 
 void PellandoFunctionality_Win64::VendorOutRequest(Request request, const Bytes& data,
@@ -139,7 +142,7 @@ void PellandoFunctionality_Win64::VendorOutRequest(Request request, const Bytes&
     block.request = static_cast<std::uint8_t>(request);
     block.value = value;
     auto length = static_cast<std::uint32_t>(data.size());
-    ThrowIfUsbIoError(device->ClassOrVendorOutRequest(data.empty() ? nullptr : data.data(), length, block),
+    ThrowIfUsbIoError(device_->ClassOrVendorOutRequest(data.empty() ? nullptr : data.data(), length, block),
                       "ClassOrVendorOutRequest");
     DataStageEnded(static_cast<std::uint32_t>(data.size()), length);
 }
@@ -150,7 +153,7 @@ void PellandoFunctionality_Win64::VendorInRequest(Request request, Bytes& data) 
     UsbIo::ClassOrVendorRequest block;
     block.request = static_cast<std::uint8_t>(request);
     auto length = static_cast<std::uint32_t>(data.size());
-    ThrowIfUsbIoError(device->ClassOrVendorInRequest(data.empty() ? nullptr : data.data(), length, block),
+    ThrowIfUsbIoError(device_->ClassOrVendorInRequest(data.empty() ? nullptr : data.data(), length, block),
                       "ClassOrVendorInRequest");
     DataStageEnded(static_cast<std::uint32_t>(data.size()), length);
 }
@@ -159,21 +162,21 @@ TRACED
 void PellandoFunctionality_Win64::ReadData(std::uint8_t* buffer, std::uint32_t length,
                                            std::uint64_t timeout) try {
     std::uint32_t moved = length;
-    ThrowIfUsbIoError(readPipe->ReadSync(buffer, moved, WaitLimit(timeout + ReadGrace)), "ReadSync");
+    ThrowIfUsbIoError(readPipe_->ReadSync(buffer, moved, WaitLimit(timeout + ReadGrace)), "ReadSync");
     DataStageEnded(length, moved);
 }
 TRACED
 
 void PellandoFunctionality_Win64::WriteData(const std::uint8_t* buffer, std::uint32_t length) try {
     std::uint32_t moved = length;
-    ThrowIfUsbIoError(writePipe->WriteSync(buffer, moved, Platform::Infinite), "WriteSync");
+    ThrowIfUsbIoError(writePipe_->WriteSync(buffer, moved, Platform::Infinite), "WriteSync");
     DataStageEnded(length, moved);
 }
 TRACED
 
 void PellandoFunctionality_Win64::RemoveListener(Generic::EventListener*) try {
-    if (!interruptListener.IsEmpty()) {
-        interruptListener->ClearListener();
+    if (!interruptListener_.IsEmpty()) {
+        interruptListener_->ClearListener();
     }
 }
 TRACED
@@ -307,41 +310,41 @@ void PellandoFunctionality_Win64::Reset(const Bytes2& code) try {
 TRACED
 
 void PellandoFunctionality_Win64::GetDeviceIdentifier(std::string& identifier) try {
-    identifier = device->GetDevicePathName();
+    identifier = device_->GetDevicePathName();
 }
 TRACED
 
 void PellandoFunctionality_Win64::StartScan(std::uint32_t, std::uint32_t timeoutSeconds,
                                             std::uint32_t total) try {
     PrepareScan(total);
-    receiverLimit = WaitLimit(timeoutSeconds * MillisecondsPerSecond + ScanGrace);
-    if (!fixedSize) {
+    receiverLimit_ = WaitLimit(timeoutSeconds * MillisecondsPerSecond + ScanGrace);
+    if (!fixedSize_) {
         StartBeep();
     }
     const Platform::ScopedThreadPriority priority(Platform::HighestThreadPriority);
     VendorOutRequest(Request::Measure, {});
     ReadMeasureData();
-    scanEnd = static_cast<std::uint32_t>(scanData.Size());
+    scanEnd_ = static_cast<std::uint32_t>(scanData_.Size());
 }
 TRACED
 
 void PellandoFunctionality_Win64::GetScanData(std::uint8_t* buffer, std::uint32_t* size) try {
-    *size = std::min(*size, scanEnd - readPosition);
-    std::copy_n(scanData.Data() + readPosition, *size, buffer);
-    readPosition += *size;
+    *size = std::min(*size, scanEnd_ - readPosition_);
+    std::copy_n(scanData_.Data() + readPosition_, *size, buffer);
+    readPosition_ += *size;
 }
 TRACED
 
 void PellandoFunctionality_Win64::PrepareScan(std::uint32_t total) {
-    fixedSize = total != 0;
-    scanTotal = total;
-    received = 0;
-    readPosition = 0;
-    scanEnd = 0;
+    fixedSize_ = total != 0;
+    scanTotal_ = total;
+    received_ = 0;
+    readPosition_ = 0;
+    scanEnd_ = 0;
     if (Receiver() == nullptr) {
-        scanData.Reset(fixedSize ? scanTotal : OpenEndedScanStartSize);
+        scanData_.Reset(fixedSize_ ? scanTotal_ : OpenEndedScanStartSize);
     } else {
-        scanData.Reset(0);
+        scanData_.Reset(0);
     }
 }
 
@@ -354,34 +357,34 @@ void PellandoFunctionality_Win64::ReadMeasureData() try {
     }
     CUsbIoBuffer* current = &a;
     CUsbIoBuffer* next = &b;
-    current->NumberOfBytesToTransfer = fixedSize ? std::min(scanTotal, ScanTransferSize) : ScanTransferSize;
-    readPipe->Read(*current);
+    current->NumberOfBytesToTransfer = fixedSize_ ? std::min(scanTotal_, ScanTransferSize) : ScanTransferSize;
+    readPipe_->Read(*current);
     while (ReadMeasureDataInternal(*current, *next)) {
         std::swap(current, next);
     }
     if (Receiver() == nullptr) {
-        scanData.Resize(static_cast<std::size_t>(received));
+        scanData_.Resize(static_cast<std::size_t>(received_));
     }
 }
 TRACED
 
 bool PellandoFunctionality_Win64::ReadMeasureDataInternal(CUsbIoBuffer& current, CUsbIoBuffer& next) try {
     next.NumberOfBytesToTransfer = ScanTransferSize;
-    const std::uint64_t asked = received + current.NumberOfBytesToTransfer;
-    if (fixedSize && asked <= scanTotal) {
+    const std::uint64_t asked = received_ + current.NumberOfBytesToTransfer;
+    if (fixedSize_ && asked <= scanTotal_) {
         next.NumberOfBytesToTransfer =
-            static_cast<std::uint32_t>(std::min<std::uint64_t>(scanTotal - asked, ScanTransferSize));
+            static_cast<std::uint32_t>(std::min<std::uint64_t>(scanTotal_ - asked, ScanTransferSize));
     }
     // Where it cannot be started, the wait for it will tell.
-    readPipe->Read(next);
+    readPipe_->Read(next);
 
     const std::uint32_t timeout = Receiver() != nullptr
-                                      ? receiverLimit
+                                      ? receiverLimit_
                                       : current.NumberOfBytesToTransfer / ScanRecordSize * ScanRecordTime +
                                             static_cast<std::uint32_t>(ReadGrace);
-    const std::uint32_t status = readPipe->WaitForCompletion(current, timeout);
+    const std::uint32_t status = readPipe_->WaitForCompletion(current, timeout);
     if (status != Status::Success && Receiver() != nullptr) {
-        readPipe->CancelToCompletion(current);
+        readPipe_->CancelToCompletion(current);
         TakeScanData(current);
     }
     ThrowIfUsbIoError(status, "WaitForCompletion1");
@@ -389,8 +392,8 @@ bool PellandoFunctionality_Win64::ReadMeasureDataInternal(CUsbIoBuffer& current,
     if (current.BytesTransferred > 0 && current.BytesTransferred >= current.NumberOfBytesToTransfer) {
         return true;
     }
-    readPipe->WaitForCompletion(next, 0);
-    readPipe->CancelIo();
+    readPipe_->WaitForCompletion(next, 0);
+    readPipe_->CancelIo();
     return false;
 }
 TRACED
@@ -400,10 +403,10 @@ void PellandoFunctionality_Win64::TakeScanData(const CUsbIoBuffer& buffer) {
         CopyDataToBufferInternal(buffer);
         return;
     }
-    if (fixedSize && buffer.BytesTransferred > scanTotal - received) {
+    if (fixedSize_ && buffer.BytesTransferred > scanTotal_ - received_) {
         throw DataException("more bytes read than expected", Here());
     }
-    received += buffer.BytesTransferred;
+    received_ += buffer.BytesTransferred;
     Receiver()->Receive({static_cast<const std::uint8_t*>(buffer.Buffer), buffer.BytesTransferred});
 }
 
@@ -412,21 +415,21 @@ void PellandoFunctionality_Win64::CopyDataToBufferInternal(const CUsbIoBuffer& b
     if (count == 0) {
         return;
     }
-    const std::uint64_t end = received + count;
-    if (scanData.Capacity() < end) {
-        if (fixedSize) {
+    const std::uint64_t end = received_ + count;
+    if (scanData_.Capacity() < end) {
+        if (fixedSize_) {
             throw DataException("buffer size is fix", Here());
         }
-        scanData.Reserve(std::max(std::uint64_t{scanData.Size()} * 2, end));
+        scanData_.Reserve(std::max(std::uint64_t{scanData_.Size()} * 2, end));
     }
-    if (scanData.Size() < end) {
-        if (fixedSize || end > MaximumScanSize) {
+    if (scanData_.Size() < end) {
+        if (fixedSize_ || end > MaximumScanSize) {
             throw DataException("more bytes read than expected", Here());
         }
-        scanData.Resize(static_cast<std::size_t>(end));
+        scanData_.Resize(static_cast<std::size_t>(end));
     }
-    std::memcpy(scanData.Data() + received, buffer.Buffer, count);
-    received = end;
+    std::memcpy(scanData_.Data() + received_, buffer.Buffer, count);
+    received_ = end;
 }
 TRACED
 

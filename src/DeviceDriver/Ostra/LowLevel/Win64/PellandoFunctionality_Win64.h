@@ -82,20 +82,20 @@ class PellandoFunctionality_Win64 final : public PellandoFunctionalityByte {
     static void BeepTask();
 
     // In the order that their destruction needs, last first: the listener's thread, pipes, device.
-    const Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIo> device;
-    const Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe> writePipe;
-    const Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe> readPipe;
-    const Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe> interruptPipe;
-    Varnholt::Utilities::Tools::SmartPointer<InterruptListener_Win64> interruptListener;
-    std::string devicePath;
+    const Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIo> device_;
+    const Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe> writePipe_;
+    const Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe> readPipe_;
+    const Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe> interruptPipe_;
+    Varnholt::Utilities::Tools::SmartPointer<InterruptListener_Win64> interruptListener_;
+    std::string devicePath_;
 
-    ScanBuffer scanData;              ///< of the last scan
-    std::uint64_t received = 0;       ///< bytes that the running scan has brought
-    std::uint32_t readPosition = 0;   ///< next byte that `GetScanData` hands out
-    std::uint32_t scanEnd = 0;        ///< bytes that it can hand out
-    bool fixedSize = true;            ///< the running scan was asked for a number of bytes
-    std::uint32_t scanTotal = 0;      ///< that number
-    std::uint32_t receiverLimit = 0;  ///< milliseconds for a transfer of a scan that has a receiver
+    ScanBuffer scanData_;              ///< of the last scan
+    std::uint64_t received_ = 0;       ///< bytes that the running scan has brought
+    std::uint32_t readPosition_ = 0;   ///< next byte that `GetScanData` hands out
+    std::uint32_t scanEnd_ = 0;        ///< bytes that it can hand out
+    bool fixedSize_ = true;            ///< the running scan was asked for a number of bytes
+    std::uint32_t scanTotal_ = 0;      ///< that number
+    std::uint32_t receiverLimit_ = 0;  ///< milliseconds for a transfer of a scan that has a receiver
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

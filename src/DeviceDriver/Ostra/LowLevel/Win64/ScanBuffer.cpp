@@ -11,35 +11,35 @@ void ScanBuffer::Freer::operator()(std::uint8_t* bytes) const noexcept {
 }
 
 void ScanBuffer::Reset(std::size_t newSize) {
-    size = 0;
-    if (capacity < newSize) {
-        memory.reset();
-        capacity = 0;
-        memory.reset(static_cast<std::uint8_t*>(std::calloc(newSize, 1)));
-        if (!memory) {
+    size_ = 0;
+    if (capacity_ < newSize) {
+        memory_.reset();
+        capacity_ = 0;
+        memory_.reset(static_cast<std::uint8_t*>(std::calloc(newSize, 1)));
+        if (!memory_) {
             throw std::bad_alloc();
         }
-        capacity = newSize;
+        capacity_ = newSize;
     }
-    size = newSize;
+    size_ = newSize;
 }
 
 void ScanBuffer::Reserve(std::uint64_t newCapacity) {
-    if (newCapacity <= capacity) {
+    if (newCapacity <= capacity_) {
         return;
     }
     const auto bytes = static_cast<std::size_t>(newCapacity);
-    void* const moved = bytes == newCapacity ? std::realloc(memory.get(), bytes) : nullptr;
+    void* const moved = bytes == newCapacity ? std::realloc(memory_.get(), bytes) : nullptr;
     if (!moved) {
         throw std::bad_alloc();
     }
-    static_cast<void>(memory.release());
-    memory.reset(static_cast<std::uint8_t*>(moved));
-    capacity = bytes;
+    static_cast<void>(memory_.release());
+    memory_.reset(static_cast<std::uint8_t*>(moved));
+    capacity_ = bytes;
 }
 
 void ScanBuffer::Resize(std::size_t newSize) {
-    size = std::min(newSize, capacity);
+    size_ = std::min(newSize, capacity_);
 }
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

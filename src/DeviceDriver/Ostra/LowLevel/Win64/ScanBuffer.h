@@ -18,18 +18,18 @@ class ScanBuffer final {
     /// At most the capacity. Bytes that are added are of any content.
     void Resize(std::size_t newSize);
 
-    std::uint8_t* Data() const { return memory.get(); }
-    std::size_t Size() const { return size; }
-    std::size_t Capacity() const { return capacity; }
+    std::uint8_t* Data() const { return memory_.get(); }
+    std::size_t Size() const { return size_; }
+    std::size_t Capacity() const { return capacity_; }
 
   private:
     struct Freer {
         void operator()(std::uint8_t* bytes) const noexcept;
     };
 
-    std::unique_ptr<std::uint8_t, Freer> memory;
-    std::size_t size = 0;
-    std::size_t capacity = 0;
+    std::unique_ptr<std::uint8_t, Freer> memory_;
+    std::size_t size_ = 0;
+    std::size_t capacity_ = 0;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

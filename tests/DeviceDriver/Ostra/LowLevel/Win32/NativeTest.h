@@ -16,12 +16,12 @@ inline std::string ErrorSuffix(Platform::ErrorCode code) {
 class AbandonedMutex final {
   public:
     AbandonedMutex() {
-        BackgroundThread([this] { Platform::Wait(mutex.Get(), Platform::Infinite); }).Join();
+        BackgroundThread([this] { Platform::Wait(mutex_.Get(), Platform::Infinite); }).Join();
     }
-    Platform::Handle Get() const { return mutex.Get(); }
+    Platform::Handle Get() const { return mutex_.Get(); }
 
   private:
-    const Platform::OwnedHandle mutex{Platform::MakeMutex("")};
+    const Platform::OwnedHandle mutex_{Platform::MakeMutex("")};
 };
 
 /// A handle that names nothing. (That of an object which is no more could come to name another.)
@@ -35,7 +35,7 @@ class NativeTest : public DriverTest {
     explicit NativeTest(TestTime time = TestTime::Virtual) : DriverTest(time) {}
 
     /// The listener's thread waits for the instrument.
-    bool IsListening() const { return driver.Running(Protocol::NativeDriver::InterruptPipe) == 1; }
+    bool IsListening() const { return driver_.Running(Protocol::NativeDriver::InterruptPipe) == 1; }
 };
 
 }  // namespace Varnholt::Tests

@@ -16,25 +16,25 @@ class NativeCommands : public NativeTest {
   protected:
     void SetUp() override {
         WaitUntil([this] { return IsListening(); });
-        driver.TakeTranscript();
+        driver_.TakeTranscript();
     }
-    PellandoFunctionality_PC instrument{nullptr, 0};
+    PellandoFunctionality_PC instrument_{nullptr, 0};
 };
 
 TEST_F(NativeCommands, SendWhatEarlierCommandsLeft) {
     Bytes2 value{0x77, 0x1F};
     std::uint8_t p4 = 0, p5 = 0;
-    driver.Script(0, {.data = Counting(8, 0xA1)});
-    instrument.GetMeasureParameters(value, value, value, p4, p5);
-    instrument.SetMeasureParameters({}, {}, {}, 0);
-    instrument.Reset({0x77, 0x1F});
-    driver.Script(0, {.data = {}});  // nothing answered: the left-over bytes come back
-    instrument.ReadCPLD(value);
+    driver_.Script(0, {.data = Counting(8, 0xA1)});
+    instrument_.GetMeasureParameters(value, value, value, p4, p5);
+    instrument_.SetMeasureParameters({}, {}, {}, 0);
+    instrument_.Reset({0x77, 0x1F});
+    driver_.Script(0, {.data = {}});  // nothing answered: the left-over bytes come back
+    instrument_.ReadCPLD(value);
     EXPECT_THAT(value, ElementsAre(0x1F, 0x1F));
     const std::uint8_t image = 0x99;
-    instrument.DownloadRAMFirmware(0x1234, &image, 1);
-    instrument.SetMeasureMode(1);
-    EXPECT_THAT(driver.TakeTransfers(),
+    instrument_.DownloadRAMFirmware(0x1234, &image, 1);
+    instrument_.SetMeasureMode(1);
+    EXPECT_THAT(driver_.TakeTransfers(),
                 ElementsAre("control 22000D 01 02 00 00 C2 00 00 00 00 00 / [8]",
                             "control 22000D 00 02 00 00 C1 00 00 00 00 00 / 00 00 00 00 00 00 00 A8",
                             "control 22000D 00 02 00 00 CA 00 00 00 00 00 / 1F",
@@ -45,7 +45,7 @@ TEST_F(NativeCommands, SendWhatEarlierCommandsLeft) {
 
 TEST_F(NativeCommands, GiveTheirTransfersTheirTime) {
     const Bytes data(256);
-    const auto write = [&] { instrument.WriteEEPROM({}, {}, data.data(), 256); };
+    const auto write = [&] { instrument_.WriteEEPROM({}, {}, data.data(), 256); };
     const struct {
         const char* name;
         std::function<void()> run;
@@ -55,16 +55,16 @@ TEST_F(NativeCommands, GiveTheirTransfersTheirTime) {
     } cases[] = {
         {"write", write, 2, 0, 2560 + 5000},
         {"end of a write", write, 2, 2, 5000},
-        {"scan", [&] { instrument.StartScan(5, 2, 0); }, 1, 0, 2000 + 3000},
-        {"counted scan", [&] { instrument.StartScan(5, 2, 50); }, 1, 0, 2000 + 3000},
+        {"scan", [&] { instrument_.StartScan(5, 2, 0); }, 1, 0, 2000 + 3000},
+        {"counted scan", [&] { instrument_.StartScan(5, 2, 50); }, 1, 0, 2000 + 3000},
     };
     for (const auto& row : cases) {
         SCOPED_TRACE(row.name);
         for (std::size_t i = 0; i < row.answeredBefore; ++i) {
-            driver.Script(row.pipe, {});
+            driver_.Script(row.pipe, {});
         }
-        driver.Script(row.pipe, {.after = Never});
-        const Stopwatch watch(clock);
+        driver_.Script(row.pipe, {.after = Never});
+        const Stopwatch watch(clock_);
         EXPECT_THROW(row.run(), IOException);
         watch.Expect(1 + row.milliseconds);
     }
@@ -78,42 +78,42 @@ Bytes NextRecord(PellandoFunctionality_PC& instrument, std::uint32_t size) {
 }
 
 TEST_F(NativeCommands, HandOutTheRecordsOfAScan) {
-    driver.Script(1, {.data = Counting(10, 1)});
-    driver.Script(1, {.data = Counting(10, 11)});
-    instrument.StartScan(5, 1, 0);
-    EXPECT_EQ(NextRecord(instrument, 5), Counting(5, 1));
-    EXPECT_EQ(NextRecord(instrument, 3), Counting(3, 6)) << "a smaller buffer takes the record's beginning";
-    EXPECT_EQ(NextRecord(instrument, 8), Counting(5, 11))
+    driver_.Script(1, {.data = Counting(10, 1)});
+    driver_.Script(1, {.data = Counting(10, 11)});
+    instrument_.StartScan(5, 1, 0);
+    EXPECT_EQ(NextRecord(instrument_, 5), Counting(5, 1));
+    EXPECT_EQ(NextRecord(instrument_, 3), Counting(3, 6)) << "a smaller buffer takes the record's beginning";
+    EXPECT_EQ(NextRecord(instrument_, 8), Counting(5, 11))
         << "a larger one gets no more than the record holds";
-    EXPECT_EQ(NextRecord(instrument, 5), Counting(5, 16));
-    EXPECT_THAT(NextRecord(instrument, 5), IsEmpty());
+    EXPECT_EQ(NextRecord(instrument_, 5), Counting(5, 16));
+    EXPECT_THAT(NextRecord(instrument_, 5), IsEmpty());
 
-    driver.Script(1, {.data = Counting(50, 1)});
-    driver.Script(1, {.data = Counting(10, 51)});
-    instrument.StartScan(5, 1, 60);
-    EXPECT_EQ(NextRecord(instrument, 5), Counting(5, 1));
-    driver.Script(1, {.data = Counting(5, 0x71)});
-    instrument.StartScan(5, 1, 0);
-    EXPECT_EQ(NextRecord(instrument, 5), Counting(5, 0x71)) << "a new scan begins with an empty list";
-    EXPECT_THAT(NextRecord(instrument, 5), IsEmpty());
+    driver_.Script(1, {.data = Counting(50, 1)});
+    driver_.Script(1, {.data = Counting(10, 51)});
+    instrument_.StartScan(5, 1, 60);
+    EXPECT_EQ(NextRecord(instrument_, 5), Counting(5, 1));
+    driver_.Script(1, {.data = Counting(5, 0x71)});
+    instrument_.StartScan(5, 1, 0);
+    EXPECT_EQ(NextRecord(instrument_, 5), Counting(5, 0x71)) << "a new scan begins with an empty list";
+    EXPECT_THAT(NextRecord(instrument_, 5), IsEmpty());
 
-    driver.Script(1, {.data = Counting(10, 1)});
-    ExpectThrow<IOException>("Read data failed (OverlappedRead)", [&] { instrument.StartScan(5, 1, 0); });
-    EXPECT_THAT(NextRecord(instrument, 5), IsEmpty()) << "what came before the failure is discarded";
+    driver_.Script(1, {.data = Counting(10, 1)});
+    ExpectThrow<IOException>("Read data failed (OverlappedRead)", [&] { instrument_.StartScan(5, 1, 0); });
+    EXPECT_THAT(NextRecord(instrument_, 5), IsEmpty()) << "what came before the failure is discarded";
 }
 
 TEST_F(NativeCommands, ScanAtRaisedPriorityAndGiveItBack) {
     int during = 0;
     const auto look = [&] { during = CurrentThreadPriority(); };
     const int before = CurrentThreadPriority();
-    driver.Script(1, {.data = Counting(5, 1), .onStart = look});
-    instrument.StartScan(5, 1, 0);
+    driver_.Script(1, {.data = Counting(5, 1), .onStart = look});
+    instrument_.StartScan(5, 1, 0);
     EXPECT_EQ(during, HighestThreadPriority);
     EXPECT_EQ(CurrentThreadPriority(), before);
 
     during = 0;
-    driver.Script(1, {.code = Errors::GeneralFailure, .onStart = look});
-    EXPECT_THROW(instrument.StartScan(5, 1, 50), IOException);
+    driver_.Script(1, {.code = Errors::GeneralFailure, .onStart = look});
+    EXPECT_THROW(instrument_.StartScan(5, 1, 50), IOException);
     EXPECT_EQ(during, HighestThreadPriority);
     EXPECT_EQ(CurrentThreadPriority(), before);
 }

@@ -35,16 +35,16 @@ class NativeDevice : public NativeTest {
     NativeDevice() : NativeTest(TestTime::RealForThreadSanitizer) {}
 
     std::unique_ptr<PellandoUSBDevice> Open() {
-        auto device = std::make_unique<PellandoUSBDevice>(&listener, Path);
+        auto device = std::make_unique<PellandoUSBDevice>(&listener_, Path);
         WaitUntil([this] { return IsListening(); });
         return device;
     }
-    RecordingListener listener;
+    RecordingListener listener_;
 };
 
 TEST_F(NativeDevice, OpensItsPipesAndClosesThemInReverse) {
     Open().reset();
-    Lines transcript = driver.TakeTranscript();
+    Lines transcript = driver_.TakeTranscript();
     EXPECT_THAT(transcript,
                 ElementsAre("open native/1", "open native/1\\PIPE01", "open native/1\\PIPE02",
                             "open native/1\\PIPE03", "read 3 [8]",
@@ -56,14 +56,14 @@ TEST_F(NativeDevice, OpensItsPipesAndClosesThemInReverse) {
 
 TEST_F(NativeDevice, SaysNothingOfAButtonThatWasUsed) {
     auto device = Open();
-    driver.Complete(InterruptPipe, ButtonData);
-    WaitUntil([&] { return !listener.Codes().empty() && IsListening(); });
-    driver.Script(1, {.data = {7}});
+    driver_.Complete(InterruptPipe, ButtonData);
+    WaitUntil([&] { return !listener_.Codes().empty() && IsListening(); });
+    driver_.Script(1, {.data = {7}});
     EXPECT_NO_THROW(ReadOneByte(*device)) << "only the end of the instrument closes its pipes";
-    driver.TakeTranscript();
+    driver_.TakeTranscript();
     device.reset();
-    EXPECT_THAT(driver.TakeTransfers(), ElementsAre("cancel 3"));
-    EXPECT_THAT(listener.Codes(), ElementsAre(MessageButtonData));
+    EXPECT_THAT(driver_.TakeTransfers(), ElementsAre("cancel 3"));
+    EXPECT_THAT(listener_.Codes(), ElementsAre(MessageButtonData));
 }
 
 TEST_F(NativeDevice, ClosesWhateverTheUntouchedControlsMeet) {
@@ -71,43 +71,43 @@ TEST_F(NativeDevice, ClosesWhateverTheUntouchedControlsMeet) {
          {Answer{.code = Errors::GeneralFailure}, Answer{.refusal = Errors::DeviceNotConnected},
           Answer{.after = Never, .cancelledAfter = 7}}) {
         auto device = Open();
-        driver.Script(0, answer);
-        driver.Script(0, answer);
-        const Stopwatch watch(clock);
+        driver_.Script(0, answer);
+        driver_.Script(0, answer);
+        const Stopwatch watch(clock_);
         device.reset();
         watch.ExpectAtMost(2 * (1 + 2000 + 7) + 1);
-        EXPECT_EQ(driver.OpenFiles(), 0u);
-        EXPECT_EQ(driver.RunningTransfers(), 0u);
+        EXPECT_EQ(driver_.OpenFiles(), 0u);
+        EXPECT_EQ(driver_.RunningTransfers(), 0u);
     }
 }
 
 TEST_F(NativeDevice, ThatCannotBeOpenedLeavesNothingBehind) {
     const auto expectFailure = [&](const std::string& text) {
         ExpectThrow<IOException>(text, [] { PellandoUSBDevice device(nullptr, Path); });
-        EXPECT_EQ(driver.OpenFiles(), 0u);
-        EXPECT_THAT(driver.TakeTransfers(), IsEmpty());
+        EXPECT_EQ(driver_.OpenFiles(), 0u);
+        EXPECT_THAT(driver_.TakeTransfers(), IsEmpty());
     };
     InstallCallFilter([](std::string_view call) {
         return call == "StartThread" ? Errors::NoSystemResources : Errors::Success;
     });
     expectFailure("could not create interrupt listener thread");
     InstallCallFilter({});
-    driver.RefuseOpen(Path + "\\PIPE03", Errors::FileNotFound);
+    driver_.RefuseOpen(Path + "\\PIPE03", Errors::FileNotFound);
     expectFailure("interrupt listener thread had timeout");
     for (const char* pipe : {"\\PIPE02", "\\PIPE01", ""}) {
-        driver.RefuseOpen(Path + pipe, Errors::FileNotFound);
+        driver_.RefuseOpen(Path + pipe, Errors::FileNotFound);
         expectFailure("could not open pipe:" + ErrorSuffix(Errors::FileNotFound));
     }
 }
 
 TEST_F(NativeDevice, ClosesItsPipesWhenTheInstrumentIsGone) {
     auto device = Open();
-    driver.TakeTranscript();
-    driver.Complete(InterruptPipe, {.code = Errors::DeviceNotConnected});
-    WaitUntil([&] { return driver.OpenFiles() == 0; });
-    EXPECT_THAT(listener.Codes(), ElementsAre(MessageDeviceGone));
-    EXPECT_THAT(driver.TakeTranscript(), ElementsAre("close native/1\\PIPE02", "close native/1\\PIPE01",
-                                                     "close native/1", "close native/1\\PIPE03"));
+    driver_.TakeTranscript();
+    driver_.Complete(InterruptPipe, {.code = Errors::DeviceNotConnected});
+    WaitUntil([&] { return driver_.OpenFiles() == 0; });
+    EXPECT_THAT(listener_.Codes(), ElementsAre(MessageDeviceGone));
+    EXPECT_THAT(driver_.TakeTranscript(), ElementsAre("close native/1\\PIPE02", "close native/1\\PIPE01",
+                                                      "close native/1", "close native/1\\PIPE03"));
     const std::string suffix = ErrorSuffix(Errors::InvalidHandle);
     ExpectThrow<IOException>("read data failed" + suffix, [&] { ReadOneByte(*device); });
     ExpectThrow<TimeoutException>("Device IO control failed " + suffix,
@@ -116,20 +116,20 @@ TEST_F(NativeDevice, ClosesItsPipesWhenTheInstrumentIsGone) {
     ExpectThrow<IOException>("Read data failed (OverlappedRead)",
                              [&] { device->ReadDataStrip(records, 5, 0); });
     device.reset();
-    EXPECT_THAT(driver.TakeTranscript(), IsEmpty());
+    EXPECT_THAT(driver_.TakeTranscript(), IsEmpty());
 }
 
 TEST_F(NativeDevice, KeepsItsPipesOpenWithoutAListener) {
     for (const bool isRemoved : {false, true}) {
-        PellandoUSBDevice device(isRemoved ? &listener : nullptr, Path);
+        PellandoUSBDevice device(isRemoved ? &listener_ : nullptr, Path);
         if (isRemoved) {
             device.RemoveListener(nullptr);  // whichever it is
         }
         device.MessageFromDevice(MessageDeviceGone, 0);
-        driver.Script(1, {.data = {7}});
+        driver_.Script(1, {.data = {7}});
         EXPECT_NO_THROW(ReadOneByte(device));
     }
-    EXPECT_THAT(listener.Codes(), IsEmpty());
+    EXPECT_THAT(listener_.Codes(), IsEmpty());
 }
 
 /// Whoever holds the mutex named after the path keeps every transfer of every device of that path waiting.
@@ -144,10 +144,10 @@ TEST_F(NativeDevice, TakesTheDeviceLockForEveryTransfer) {
         [&] { device->ReadDataStrip(records, 1, 0); },
         [&] { device->ReadDataCountedStrip(records, 1, 0, 1); },
         [&] { device->MessageFromDevice(MessageButtonData, 0); },
-        [&] { device->RemoveListener(&listener); },
+        [&] { device->RemoveListener(&listener_); },
     };
     for (const auto& operation : operations) {
-        driver.Script(1, {.data = {7}});
+        driver_.Script(1, {.data = {7}});
         Mutex mutex("native1");
         mutex.Lock();
         BackgroundThread other(operation);
@@ -160,14 +160,14 @@ TEST_F(NativeDevice, TakesTheDeviceLockForEveryTransfer) {
 
 TEST_F(NativeDevice, HoldsTheDeviceLockThroughAStrip) {
     auto device = Open();
-    driver.Script(1, {.data = Counting(10, 1), .after = 500});
-    driver.Script(1, {.after = 1000});
+    driver_.Script(1, {.data = Counting(10, 1), .after = 500});
+    driver_.Script(1, {.after = 1000});
     BackgroundThread scan([&] {
         ScanRecordList records;
         device->ReadDataStrip(records, 5, 0);
         EXPECT_THAT(records, SizeIs(2));
     });
-    WaitUntil([&] { return driver.Running(1) == 2; });
+    WaitUntil([&] { return driver_.Running(1) == 2; });
     Mutex mutex("native1");
     ASSERT_FALSE(mutex.TryLock(600));
     EXPECT_TRUE(mutex.TryLock(3000));
@@ -182,62 +182,62 @@ TEST_F(NativeDevice, RemovesAListenerWhoseMessageWaitsForTheDeviceLock) {
     {
         Mutex mutex("native1");
         const ScopedLock held(mutex);
-        driver.Complete(InterruptPipe, ButtonData);
+        driver_.Complete(InterruptPipe, ButtonData);
         SleepMilliseconds(10);  // the message waits for the lock
-        device->RemoveListener(&listener);
+        device->RemoveListener(&listener_);
     }
     SleepMilliseconds(10);
-    EXPECT_THAT(listener.Codes(), IsEmpty());
-    driver.Complete(InterruptPipe, ButtonData);
+    EXPECT_THAT(listener_.Codes(), IsEmpty());
+    driver_.Complete(InterruptPipe, ButtonData);
     SleepMilliseconds(10);
-    EXPECT_THAT(listener.Codes(), IsEmpty());
+    EXPECT_THAT(listener_.Codes(), IsEmpty());
 }
 
 TEST_F(NativeDevice, RemovesAListenerOnlyAfterTheMessageUnderWay) {
     auto device = Open();
     std::atomic<bool> isInside = false;
-    listener.onMessage = [&](std::uint32_t) {
+    listener_.onMessage = [&](std::uint32_t) {
         isInside = true;
         SleepMilliseconds(50);
         isInside = false;
     };
-    driver.Complete(InterruptPipe, ButtonData);
+    driver_.Complete(InterruptPipe, ButtonData);
     WaitUntil([&] { return isInside.load(); });
-    device->RemoveListener(&listener);
+    device->RemoveListener(&listener_);
     EXPECT_FALSE(isInside);
-    EXPECT_THAT(listener.Codes(), ElementsAre(MessageButtonData));
+    EXPECT_THAT(listener_.Codes(), ElementsAre(MessageButtonData));
 }
 
 TEST_F(NativeDevice, RemovesAListenerFromInsideItsMessage) {
     auto device = Open();
-    listener.onMessage = [&](std::uint32_t) { device->RemoveListener(&listener); };
+    listener_.onMessage = [&](std::uint32_t) { device->RemoveListener(&listener_); };
     for (int i = 0; i < 2; ++i) {
-        WaitUntil([&] { return driver.Complete(InterruptPipe, ButtonData); });
+        WaitUntil([&] { return driver_.Complete(InterruptPipe, ButtonData); });
     }
     WaitUntil([&] { return IsListening(); });
-    EXPECT_THAT(listener.Codes(), ElementsAre(MessageButtonData));
+    EXPECT_THAT(listener_.Codes(), ElementsAre(MessageButtonData));
     device.reset();
-    EXPECT_EQ(driver.OpenFiles(), 0u);
+    EXPECT_EQ(driver_.OpenFiles(), 0u);
 }
 
 TEST_F(NativeDevice, MayBeUsedAndClosedFromInsideAMessage) {
     for (const std::uint32_t code : {MessageButtonData, MessageDeviceGone}) {
         auto device = Open();
         std::atomic<bool> hasReturned = false;
-        listener.onMessage = [&](std::uint32_t received) {
+        listener_.onMessage = [&](std::uint32_t received) {
             EXPECT_EQ(received, code);
-            driver.Script(1, {.data = {7}});
+            driver_.Script(1, {.data = {7}});
             EXPECT_NO_THROW(ReadOneByte(*device));
-            const Stopwatch watch(clock);
+            const Stopwatch watch(clock_);
             device.reset();
             watch.ExpectAtMost(2u);
             hasReturned = true;
         };
-        driver.Complete(InterruptPipe, code == MessageButtonData ? ButtonData : Answer{});
-        WaitUntil([&] { return hasReturned.load() && driver.OpenFiles() == 0; });
+        driver_.Complete(InterruptPipe, code == MessageButtonData ? ButtonData : Answer{});
+        WaitUntil([&] { return hasReturned.load() && driver_.OpenFiles() == 0; });
         EXPECT_EQ(device, nullptr);
     }
-    EXPECT_THAT(listener.Codes(), ElementsAre(MessageButtonData, MessageDeviceGone));
+    EXPECT_THAT(listener_.Codes(), ElementsAre(MessageButtonData, MessageDeviceGone));
 }
 
 /// Closing is bounded even if somebody holds the device lock and the listener's thread waits for it; that
@@ -253,29 +253,29 @@ TEST_F(NativeDevice, ClosesInTimeWhileAMessageWaitsForTheDeviceLock) {
         Wait(release.Get(), Infinite);
     });
     WaitUntil([&] { return isHeld.load(); });
-    driver.Complete(InterruptPipe, ButtonData);
+    driver_.Complete(InterruptPipe, ButtonData);
     SleepMilliseconds(10);  // the message waits for the lock
-    const Stopwatch watch(clock);
+    const Stopwatch watch(clock_);
     device.reset();
     watch.ExpectAtMost(11'000u);
-    EXPECT_EQ(driver.OpenFiles(), 0u);
+    EXPECT_EQ(driver_.OpenFiles(), 0u);
     SignalEvent(release.Get());
     holder.Join();
     SleepMilliseconds(10);
-    EXPECT_THAT(listener.Codes(), IsEmpty());
+    EXPECT_THAT(listener_.Codes(), IsEmpty());
 }
 
 TEST_F(NativeDevice, ClosesAtOnceWhileSomebodyHoldsTheDeviceLock) {
     auto device = Open();
-    driver.TakeTranscript();
+    driver_.TakeTranscript();
     Mutex mutex("native1");
     const ScopedLock held(mutex);
-    const Stopwatch watch(clock);
+    const Stopwatch watch(clock_);
     BackgroundThread closer([&] { device.reset(); });
     WaitUntil([&] { return closer.HasEnded(); });
     watch.ExpectAtMost(5);
     EXPECT_THAT(
-        driver.TakeTransfers(),
+        driver_.TakeTransfers(),
         ElementsAre("control 220009 00 00 00 00 00 00 84 00 00 00 / 00 00 00 00 00 00 00 00",
                     "control 220011 00 02 00 00 D0 00 03 00 00 00 / 00 00 00 00 00 00 00 00", "cancel 3"));
 }

@@ -32,17 +32,17 @@ class NativeStripRead : public NativeTest {
   protected:
     void SetUp() override {
         ObserveBeeps([this](std::uint32_t hertz, std::uint32_t milliseconds) {
-            beeps.push_back(std::to_string(hertz) + "/" + std::to_string(milliseconds));
+            beeps_.push_back(std::to_string(hertz) + "/" + std::to_string(milliseconds));
         });
         WaitUntil([this] { return IsListening(); });
-        driver.TakeTranscript();
+        driver_.TakeTranscript();
     }
     void TearDown() override { ObserveBeeps({}); }
 
     /// "10 50 x": the sizes asked for, and the cancellations.
     std::string TakeReads() {
         std::string reads;
-        for (const std::string& line : driver.TakeTransfers()) {
+        for (const std::string& line : driver_.TakeTransfers()) {
             const std::size_t size = line.find('[');
             reads += reads.empty() ? "" : " ";
             reads += line == "cancel 1" ? "x" : line.substr(size + 1, line.size() - size - 2);
@@ -50,8 +50,8 @@ class NativeStripRead : public NativeTest {
         return reads;
     }
 
-    Lines beeps;
-    PellandoUSBDevice device{nullptr, "native/1"};
+    Lines beeps_;
+    PellandoUSBDevice device_{nullptr, "native/1"};
 };
 
 /// What a read brings: so many bytes, which count on from read to read, so many milliseconds after its start.
@@ -140,27 +140,27 @@ const StripCase StripCases[] = {
 TEST_F(NativeStripRead, SizesAndEndings) {
     for (const StripCase& row : StripCases) {
         SCOPED_TRACE(row.name);
-        if (row.milliseconds > Limit && !clock.IsVirtual()) {
+        if (row.milliseconds > Limit && !clock_.IsVirtual()) {
             continue;  // the last moment is a millisecond
         }
         Bytes sent;
         for (const Brought& read : row.brought) {
             const Bytes data = Counting(read.count, static_cast<unsigned>(sent.size()));
-            driver.Script(ReadPipe, {.data = data,
-                                     .code = read.code,
-                                     .after = read.after,
-                                     .count = read.claimed,
-                                     .refusal = read.refusal});
+            driver_.Script(ReadPipe, {.data = data,
+                                      .code = read.code,
+                                      .after = read.after,
+                                      .count = read.claimed,
+                                      .refusal = read.refusal});
             sent.insert(sent.end(), data.begin(), data.end());
         }
         sent.resize(row.bytesKept);
         ScanRecordList records;
-        const Stopwatch watch(clock);
+        const Stopwatch watch(clock_);
         const auto read = [&] {
             if (row.total != 0) {
-                device.ReadDataCountedStrip(records, row.recordSize, Timeout, row.total);
+                device_.ReadDataCountedStrip(records, row.recordSize, Timeout, row.total);
             } else {
-                device.ReadDataStrip(records, row.recordSize, Timeout);
+                device_.ReadDataStrip(records, row.recordSize, Timeout);
             }
         };
         if (row.text.empty()) {
@@ -171,25 +171,25 @@ TEST_F(NativeStripRead, SizesAndEndings) {
         watch.Expect(row.milliseconds);
         EXPECT_EQ(Content(records, row.recordSize), sent);
         EXPECT_EQ(TakeReads(), row.reads);
-        EXPECT_EQ(driver.Running(ReadPipe), 0u);
+        EXPECT_EQ(driver_.Running(ReadPipe), 0u);
     }
 }
 
 TEST_F(NativeStripRead, AppendsToTheListAndBeepsOnceWhenUncounted) {
     ScanRecordList records;
-    driver.Script(ReadPipe, {.data = Counting(10)});
-    driver.Script(ReadPipe, {.data = Counting(50, 10)});
-    driver.Script(ReadPipe, {.data = {}});
-    device.ReadDataStrip(records, 5, Timeout);
-    EXPECT_THAT(beeps, ElementsAre("2140/75"));
-    driver.Script(ReadPipe, {.data = Counting(5, 60)});
-    device.ReadDataCountedStrip(records, 5, Timeout, 5);
+    driver_.Script(ReadPipe, {.data = Counting(10)});
+    driver_.Script(ReadPipe, {.data = Counting(50, 10)});
+    driver_.Script(ReadPipe, {.data = {}});
+    device_.ReadDataStrip(records, 5, Timeout);
+    EXPECT_THAT(beeps_, ElementsAre("2140/75"));
+    driver_.Script(ReadPipe, {.data = Counting(5, 60)});
+    device_.ReadDataCountedStrip(records, 5, Timeout, 5);
     EXPECT_EQ(Content(records, 5), Counting(65));
     TakeReads();
-    device.ReadDataCountedStrip(records, 5, Timeout, 0);
+    device_.ReadDataCountedStrip(records, 5, Timeout, 0);
     EXPECT_EQ(TakeReads(), "") << "nothing was asked for";
     EXPECT_THAT(records, testing::SizeIs(13));
-    EXPECT_THAT(beeps, ElementsAre("2140/75"));
+    EXPECT_THAT(beeps_, ElementsAre("2140/75"));
 }
 
 TEST_F(NativeStripRead, ReportsAnAbandonedWait) {
@@ -201,15 +201,15 @@ TEST_F(NativeStripRead, ReportsAnAbandonedWait) {
     for (const auto& row : cases) {
         const AbandonedMutex abandoned;
         ScanRecordList records;
-        driver.Script(ReadPipe, {.after = Never, .completesThrough = abandoned.Get()});
+        driver_.Script(ReadPipe, {.after = Never, .completesThrough = abandoned.Get()});
         ExpectThrow<TimeoutException>(row.text, [&] {
-            row.total == 0 ? device.ReadDataStrip(records, 5, Timeout)
-                           : device.ReadDataCountedStrip(records, 5, Timeout, row.total);
+            row.total == 0 ? device_.ReadDataStrip(records, 5, Timeout)
+                           : device_.ReadDataCountedStrip(records, 5, Timeout, row.total);
         });
-        EXPECT_EQ(driver.Running(ReadPipe), 0u);
+        EXPECT_EQ(driver_.Running(ReadPipe), 0u);
         ReleaseMutex(abandoned.Get());
     }
-    EXPECT_THAT(beeps, IsEmpty());
+    EXPECT_THAT(beeps_, IsEmpty());
 }
 
 /// The completions of the two outstanding reads share one signal. Whatever their order, no read may be waited
@@ -226,23 +226,23 @@ TEST_F(NativeStripRead, IsNotMisledByTheSharedSignal) {
                  {"both at once", 0, 0, 0}};
     for (const auto& row : cases) {
         SCOPED_TRACE(row.name);
-        if (row.first == Limit - 1 && !clock.IsVirtual()) {
+        if (row.first == Limit - 1 && !clock_.IsVirtual()) {
             continue;  // likewise
         }
         ScanRecordList records;
-        driver.Script(ReadPipe, {.data = Counting(50, 1), .after = row.first});
-        driver.Script(ReadPipe, {.data = Counting(50, 51), .after = row.second});
-        const Stopwatch watch(clock);
-        device.ReadDataCountedStrip(records, 5, Timeout, 100);
+        driver_.Script(ReadPipe, {.data = Counting(50, 1), .after = row.first});
+        driver_.Script(ReadPipe, {.data = Counting(50, 51), .after = row.second});
+        const Stopwatch watch(clock_);
+        device_.ReadDataCountedStrip(records, 5, Timeout, 100);
         EXPECT_EQ(Content(records, 5), Counting(100, 1));
         watch.Expect(row.milliseconds);
     }
     // Signals of the second read do not prolong the first one's time.
     ScanRecordList records;
-    driver.Script(ReadPipe, {.after = Never, .cancelledAfter = 5});
-    driver.Script(ReadPipe, {.data = Counting(50, 51), .after = 3000});
-    const Stopwatch watch(clock);
-    EXPECT_THROW(device.ReadDataCountedStrip(records, 5, Timeout, 100), IOException);
+    driver_.Script(ReadPipe, {.after = Never, .cancelledAfter = 5});
+    driver_.Script(ReadPipe, {.data = Counting(50, 51), .after = 3000});
+    const Stopwatch watch(clock_);
+    EXPECT_THROW(device_.ReadDataCountedStrip(records, 5, Timeout, 100), IOException);
     watch.Expect(Limit + 5);
 }
 
@@ -251,18 +251,18 @@ TEST_F(NativeStripRead, WaitsForTheEndOfWhatItCancels) {
     const Answer slow{
         .data = Counting(50, 1), .after = Never, .cancelledAfter = 30, .cancelledWithData = true};
     ScanRecordList records;
-    driver.Script(ReadPipe, {.data = Counting(5, 1)});
-    driver.Script(ReadPipe, slow);
-    driver.Script(ReadPipe, slow);
-    const Stopwatch watch(clock);
-    device.ReadDataStrip(records, 5, Timeout);
+    driver_.Script(ReadPipe, {.data = Counting(5, 1)});
+    driver_.Script(ReadPipe, slow);
+    driver_.Script(ReadPipe, slow);
+    const Stopwatch watch(clock_);
+    device_.ReadDataStrip(records, 5, Timeout);
     EXPECT_EQ(Content(records, 5), Counting(5, 1));
     watch.Expect(30u);
-    EXPECT_EQ(driver.Running(ReadPipe), 0u);
+    EXPECT_EQ(driver_.Running(ReadPipe), 0u);
     // What the ended reads signalled must not be taken for the next one's completion.
-    driver.Script(ReadPipe, {.data = Counting(4, 1), .after = 20});
+    driver_.Script(ReadPipe, {.data = Counting(4, 1), .after = 20});
     Bytes buffer(4);
-    device.ReadData(buffer.data(), 4, 0);
+    device_.ReadData(buffer.data(), 4, 0);
     EXPECT_EQ(buffer, Counting(4, 1));
 }
 

@@ -18,7 +18,7 @@ const std::string TimedOut = "Device IO control failed ";
 class UsbConnection : public NativeTest {};
 
 TEST_F(UsbConnection, ThatCannotBeMadeLeavesNothingOpen) {
-    driver.RefuseOpen("native/1\\PIPE01", Errors::AccessDenied);
+    driver_.RefuseOpen("native/1\\PIPE01", Errors::AccessDenied);
     ExpectThrow<IOException>("could not open pipe:" + ErrorSuffix(Errors::AccessDenied),
                              [] { const USBConnection connection("native/1", 1, NoHandle); });
 
@@ -28,7 +28,7 @@ TEST_F(UsbConnection, ThatCannotBeMadeLeavesNothingOpen) {
     ExpectThrow<IOException>("could not create pipe-event-handle",
                              [] { const USBConnection connection("native/1", 2, NoHandle); });
     InstallCallFilter({});
-    EXPECT_EQ(driver.OpenFiles(), 0u);
+    EXPECT_EQ(driver_.OpenFiles(), 0u);
 }
 
 TEST_F(UsbConnection, ThatIsOpenedAnewLetsGoOfWhatWasOpen) {
@@ -38,9 +38,9 @@ TEST_F(UsbConnection, ThatIsOpenedAnewLetsGoOfWhatWasOpen) {
         EXPECT_NE(connection.CompletionEvent(), event.Get());
         connection.OpenConnection(event.Get());
         EXPECT_EQ(connection.CompletionEvent(), event.Get());
-        EXPECT_EQ(driver.OpenFiles(), 1u);
+        EXPECT_EQ(driver_.OpenFiles(), 1u);
     }
-    EXPECT_EQ(driver.OpenFiles(), 0u);
+    EXPECT_EQ(driver_.OpenFiles(), 0u);
     EXPECT_TRUE(SignalEvent(event.Get())) << "which is its owner's";
 }
 
@@ -128,13 +128,13 @@ TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
     };
     for (const TransferCase& row : cases) {
         SCOPED_TRACE(row.name);
-        if (row.milliseconds > 1000 && row.text.empty() && !clock.IsVirtual()) {
+        if (row.milliseconds > 1000 && row.text.empty() && !clock_.IsVirtual()) {
             continue;  // the last moment is a millisecond
         }
         const std::uint32_t pipe = row.operation == Read64 ? 1 : row.operation == Write64 ? 2 : 0;
         USBConnection connection("native/1", pipe, NoHandle);
-        driver.Script(pipe, row.answer);
-        const Stopwatch watch(clock);
+        driver_.Script(pipe, row.answer);
+        const Stopwatch watch(clock_);
         const auto operation = [&] { row.operation(connection); };
         if (row.text.empty()) {
             EXPECT_NO_THROW(operation());
@@ -144,7 +144,7 @@ TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
             ExpectThrow<IOException>(row.text, operation);
         }
         watch.Expect(row.milliseconds);
-        EXPECT_EQ(driver.RunningTransfers(), 0u);
+        EXPECT_EQ(driver_.RunningTransfers(), 0u);
     }
 }
 
@@ -160,10 +160,10 @@ TEST_F(UsbConnection, ReportsAnAbandonedWait) {
         SCOPED_TRACE(row.text);
         const AbandonedMutex abandoned;
         USBConnection connection("native/1", row.pipe, NoHandle);
-        driver.Script(row.pipe, {.after = Never, .completesThrough = abandoned.Get()});
+        driver_.Script(row.pipe, {.after = Never, .completesThrough = abandoned.Get()});
         ExpectThrow<TimeoutException>(row.text + ErrorSuffix(Errors::IoPending),
                                       [&] { row.operation(connection); });
-        EXPECT_EQ(driver.RunningTransfers(), 0u);
+        EXPECT_EQ(driver_.RunningTransfers(), 0u);
         ReleaseMutex(abandoned.Get());
     }
 }
@@ -179,23 +179,23 @@ TEST_F(UsbConnection, ReportsNothingWhenToldSo) {
                  {{.refusal = Errors::DeviceNotConnected}, 2001},
                  {{.after = Never, .cancelledAfter = 10}, 2011}};
     for (const auto& row : cases) {
-        const Stopwatch watch(clock);
-        driver.Script(0, row.answer);
+        const Stopwatch watch(clock_);
+        driver_.Script(0, row.answer);
         EXPECT_NO_THROW(send());
         watch.Expect(row.milliseconds);
-        EXPECT_EQ(driver.RunningTransfers(), 0u);
+        EXPECT_EQ(driver_.RunningTransfers(), 0u);
     }
     connection.Close();
     EXPECT_NO_THROW(send());
 }
 
 TEST_F(UsbConnection, WaitsWithAnEndHoweverLongTheTimeout) {
-    if (!clock.IsVirtual()) {
+    if (!clock_.IsVirtual()) {
         GTEST_SKIP() << "takes weeks in real time";
     }
     USBConnection connection("native/1", 1, NoHandle);
     for (const std::uint32_t timeout : {0xFFFFFFFFu, 0xFFFFFFFFu - 4999, 0xFFFFFFFFu - 5000}) {
-        const Stopwatch watch(clock);
+        const Stopwatch watch(clock_);
         std::uint8_t byte = 0;
         ExpectThrow<IOException>("read data failed" + ErrorSuffix(Errors::IoIncomplete),
                                  [&] { connection.Read(&byte, 1, timeout); });
@@ -214,10 +214,10 @@ TEST_F(UsbConnection, ClosesOnceAndFailsAfterwards) {
 
     USBConnection own("native/1", 1, NoHandle);
     const Handle ownEvent = own.CompletionEvent();
-    driver.TakeTranscript();
+    driver_.TakeTranscript();
     own.Close();
     own.Close();
-    EXPECT_THAT(driver.TakeTranscript(), ElementsAre("close native/1\\PIPE01"));
+    EXPECT_THAT(driver_.TakeTranscript(), ElementsAre("close native/1\\PIPE01"));
     EXPECT_FALSE(SignalEvent(ownEvent));
 
     const std::string suffix = ErrorSuffix(Errors::InvalidHandle);
@@ -231,20 +231,20 @@ TEST_F(UsbConnection, ClosesOnceAndFailsAfterwards) {
 class UsbConnectionVectorRead : public NativeTest {
   protected:
     std::uint32_t Read(Answer answer) {
-        driver.Script(3, std::move(answer));
-        return connection.Read(buffer, endRequested);
+        driver_.Script(3, std::move(answer));
+        return connection_.Read(buffer_, endRequested_);
     }
 
-    std::atomic<bool> endRequested = false;
-    OwnedHandle event{MakeAutoResetEvent()};
-    USBConnection connection{"native/1", 3, event.Get()};
-    std::vector<std::uint8_t> buffer = Bytes(8);
+    std::atomic<bool> endRequested_ = false;
+    OwnedHandle event_{MakeAutoResetEvent()};
+    USBConnection connection_{"native/1", 3, event_.Get()};
+    std::vector<std::uint8_t> buffer_ = Bytes(8);
 };
 
 TEST_F(UsbConnectionVectorRead, GivesWhatCame) {
-    const std::uint32_t late = clock.IsVirtual() ? 100'000 : 100;
+    const std::uint32_t late = clock_.IsVirtual() ? 100'000 : 100;
     EXPECT_EQ(Read({.data = Counting(3, 1), .after = late}), 3u);
-    EXPECT_THAT(buffer, ElementsAre(1, 2, 3, 0, 0, 0, 0, 0));
+    EXPECT_THAT(buffer_, ElementsAre(1, 2, 3, 0, 0, 0, 0, 0));
     EXPECT_EQ(Read({.data = Counting(9, 1), .after = 1}), 8u);
     EXPECT_EQ(Read({.after = 5}), 0u);
     EXPECT_EQ(Read({.code = Errors::DeviceNotConnected, .after = 5}), 0u);
@@ -253,29 +253,29 @@ TEST_F(UsbConnectionVectorRead, GivesWhatCame) {
 }
 
 TEST_F(UsbConnectionVectorRead, EndsWhenSomebodySignalsItsEvent) {
-    const auto signal = [this] { SignalEvent(event.Get()); };
+    const auto signal = [this] { SignalEvent(event_.Get()); };
     ClockScheduler().CallAt(ClockScheduler().Now() + 100'000, signal);
     EXPECT_EQ(Read({.after = Never}), 0u);
-    EXPECT_EQ(driver.RunningTransfers(), 0u);
+    EXPECT_EQ(driver_.RunningTransfers(), 0u);
 
     ClockScheduler().CallAt(ClockScheduler().Now() + 100'000, signal);
     EXPECT_EQ(Read({.data = Counting(2, 1), .after = Never, .cancelledAfter = 3, .cancelledWithData = true}),
               2u)
         << "data that arrive during the cancellation count";
-    EXPECT_THAT(driver.TakeTransfers(), ElementsAre("read 3 [8]", "cancel 3", "read 3 [8]", "cancel 3"));
+    EXPECT_THAT(driver_.TakeTransfers(), ElementsAre("read 3 [8]", "cancel 3", "read 3 [8]", "cancel 3"));
 }
 
 TEST_F(UsbConnectionVectorRead, EndsWhenThatWasRequestedBeforeItStarted) {
-    endRequested = true;
-    SignalEvent(event.Get());
+    endRequested_ = true;
+    SignalEvent(event_.Get());
     EXPECT_EQ(Read({.after = Never}), 0u);
-    EXPECT_EQ(driver.RunningTransfers(), 0u);
+    EXPECT_EQ(driver_.RunningTransfers(), 0u);
 }
 
 TEST_F(UsbConnectionVectorRead, FailsWhenTheWaitDoes) {
     ExpectThrow<IOException>("wait failed",
                              [&] { Read({.after = Never, .completesThrough = NamesNothing()}); });
-    EXPECT_EQ(driver.RunningTransfers(), 0u);
+    EXPECT_EQ(driver_.RunningTransfers(), 0u);
 }
 
 }  // namespace

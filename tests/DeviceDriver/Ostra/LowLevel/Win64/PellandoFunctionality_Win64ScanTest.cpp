@@ -27,10 +27,10 @@ class UsbIoScan : public UsbIoTest {
     UsbIoScan() {
         Platform::ObserveBeeps([this](std::uint32_t hertz, std::uint32_t milliseconds) {
             {
-                const std::lock_guard held(beepLock);
-                beeps.emplace_back(hertz, milliseconds);
+                const std::lock_guard held(beepLock_);
+                beeps_.emplace_back(hertz, milliseconds);
             }
-            Platform::SignalEvent(beeped.Get());
+            Platform::SignalEvent(beeped_.Get());
         });
     }
     ~UsbIoScan() override { Platform::ObserveBeeps({}); }
@@ -38,8 +38,8 @@ class UsbIoScan : public UsbIoTest {
     /// The instrument sends the stream in transfers of these sizes, one after the other.
     void Send(const std::vector<std::uint32_t>& sizes, std::uint32_t after) {
         for (const std::uint32_t size : sizes) {
-            driver.Script(BulkInEndpoint, {.data = Stream(sent, size), .after = after});
-            sent += size;
+            driver_.Script(BulkInEndpoint, {.data = Stream(sent_, size), .after = after});
+            sent_ += size;
         }
     }
 
@@ -56,10 +56,10 @@ class UsbIoScan : public UsbIoTest {
         }
     }
 
-    std::size_t sent = 0;
-    std::mutex beepLock;
-    std::vector<std::pair<std::uint32_t, std::uint32_t>> beeps;
-    Platform::OwnedHandle beeped{Platform::MakeAutoResetEvent()};
+    std::size_t sent_ = 0;
+    std::mutex beepLock_;
+    std::vector<std::pair<std::uint32_t, std::uint32_t>> beeps_;
+    Platform::OwnedHandle beeped_{Platform::MakeAutoResetEvent()};
 };
 
 std::string Read(std::uint32_t size) {
@@ -88,7 +88,7 @@ TEST_F(UsbIoScan, FixedScans) {
     for (const std::uint32_t after : {0U, 1U}) {
         for (const Case& row : cases) {
             const auto instrument = Open();
-            sent = 0;
+            sent_ = 0;
             Send(row.transfers, after);
             instrument->StartScan(256, 1, row.total);
             Lines expected{"control 80942035 00 00 00 00 02 00 00 00 00 00 00 00 00 C0 00 00 00 00 /"};
@@ -98,29 +98,29 @@ TEST_F(UsbIoScan, FixedScans) {
             expected.emplace_back("cancel 82");
             EXPECT_THAT(TakeTranscript(), testing::ElementsAreArray(expected)) << row.name;
             EXPECT_EQ(TakeAll(*instrument, 256), Stream(0, row.end)) << row.name;
-            EXPECT_EQ(driver.Running(BulkInEndpoint), 0U) << row.name;
+            EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U) << row.name;
         }
     }
-    EXPECT_TRUE(beeps.empty());
+    EXPECT_TRUE(beeps_.empty());
 }
 
 TEST_F(UsbIoScan, OpenEndedScansGrow) {
     const auto instrument = Open();
     for (const std::uint32_t total : {0U, 256U, Whole, 1280000U, 2000000U}) {
-        sent = 0;
+        sent_ = 0;
         Send(std::vector<std::uint32_t>(total / Whole, Whole), 0);
         Send({total % Whole}, 1);
-        const Stopwatch stopwatch(clock);
+        const Stopwatch stopwatch(clock_);
         instrument->StartScan(256, 1, 0);
         EXPECT_LT(stopwatch.Milliseconds(), 300U) << "a scan does not wait for its beep";
         EXPECT_EQ(TakeAll(*instrument, 100000), Stream(0, total)) << total;
-        EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+        EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
         // Each scan beeps once, and the beep comes by itself.
-        ASSERT_EQ(Platform::Wait(beeped.Get(), 10000), Platform::WaitResult::Signalled);
+        ASSERT_EQ(Platform::Wait(beeped_.Get(), 10000), Platform::WaitResult::Signalled);
         stopwatch.ExpectBetween(370, 372);
-        const std::lock_guard held(beepLock);
-        EXPECT_EQ(beeps, (std::vector<std::pair<std::uint32_t, std::uint32_t>>{{2140, 75}})) << total;
-        beeps.clear();
+        const std::lock_guard held(beepLock_);
+        EXPECT_EQ(beeps_, (std::vector<std::pair<std::uint32_t, std::uint32_t>>{{2140, 75}})) << total;
+        beeps_.clear();
     }
 }
 
@@ -128,25 +128,26 @@ TEST_F(UsbIoScan, AReadIsPendingWhileTheOtherIsProcessed) {
     // An instrument that completes a transfer only when it has got the next one.
     const auto instrument = Open();
     std::vector<bool> completed;
-    const auto completeOther = [&] { completed.push_back(driver.Complete(BulkInEndpoint)); };
+    const auto completeOther = [&] { completed.push_back(driver_.Complete(BulkInEndpoint)); };
     for (int i = 0; i < 4; ++i) {
-        driver.Script(BulkInEndpoint,
-                      {.data = Stream(sent, Whole), .after = Never, .onStart = completeOther});
-        sent += Whole;
+        driver_.Script(BulkInEndpoint,
+                       {.data = Stream(sent_, Whole), .after = Never, .onStart = completeOther});
+        sent_ += Whole;
     }
-    driver.Script(BulkInEndpoint, {.after = 1, .onStart = completeOther});
-    instrument->StartScan(256, 1, static_cast<std::uint32_t>(sent));
+    driver_.Script(BulkInEndpoint, {.after = 1, .onStart = completeOther});
+    instrument->StartScan(256, 1, static_cast<std::uint32_t>(sent_));
     EXPECT_THAT(completed, testing::ElementsAre(false, true, true, true, true));
-    EXPECT_EQ(TakeAll(*instrument, Whole), Stream(0, sent));
+    EXPECT_EQ(TakeAll(*instrument, Whole), Stream(0, sent_));
 }
 
 TEST_F(UsbIoScan, WhatComesBehindTheEndIsDropped) {
     const auto instrument = Open();
-    driver.Script(BulkInEndpoint, {.data = Stream(0, 100), .after = 2});
-    driver.Script(BulkInEndpoint,
-                  {.data = Bytes(50, 0xEE), .after = Never, .cancelledAfter = 20, .cancelledWithData = true});
+    driver_.Script(BulkInEndpoint, {.data = Stream(0, 100), .after = 2});
+    driver_.Script(
+        BulkInEndpoint,
+        {.data = Bytes(50, 0xEE), .after = Never, .cancelledAfter = 20, .cancelledWithData = true});
     instrument->StartScan(256, 1, 1000);
-    EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
+    EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
     EXPECT_EQ(TakeAll(*instrument, 64), Stream(0, 100));
 }
 
@@ -176,18 +177,18 @@ TEST_F(UsbIoScan, FailedScansLeaveNothing) {
     };
     const auto instrument = Open();
     for (const Case& row : cases) {
-        sent = 0;
+        sent_ = 0;
         Send({Whole}, 1);
-        driver.Script(BulkInEndpoint, row.answer);
+        driver_.Script(BulkInEndpoint, row.answer);
         const int priority = Platform::CurrentThreadPriority();
-        const Stopwatch stopwatch(clock);
+        const Stopwatch stopwatch(clock_);
         ExpectThrow<IOException>(row.text, [&] { instrument->StartScan(256, 1, 3 * Whole); });
         stopwatch.ExpectBetween(row.waits, row.waits + 40);
         EXPECT_EQ(Platform::CurrentThreadPriority(), priority);
-        EXPECT_EQ(driver.Running(BulkInEndpoint), 0U) << row.name;
+        EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U) << row.name;
         EXPECT_EQ(TakeAll(*instrument, 256), Bytes()) << row.name;
     }
-    sent = 0;
+    sent_ = 0;
     Send({10}, 1);
     instrument->StartScan(256, 1, 10000);
     EXPECT_EQ(TakeAll(*instrument, 256), Stream(0, 10)) << "and the next one works";
@@ -198,9 +199,9 @@ TEST_F(UsbIoScan, ThePriorityIsRaisedForTheScanOnly) {
     const Platform::ScopedThreadPriority usual(-1);
     const int before = Platform::CurrentThreadPriority();
     int during = -99;
-    driver.Script(BulkInEndpoint, {.data = Bytes(5), .after = 1, .onStart = [&] {
-                                       during = Platform::CurrentThreadPriority();
-                                   }});
+    driver_.Script(BulkInEndpoint, {.data = Bytes(5), .after = 1, .onStart = [&] {
+                                        during = Platform::CurrentThreadPriority();
+                                    }});
     instrument->StartScan(256, 1, 1000);
     // Where the system refuses a level, it stays as it was.
     const bool mayRaise = [] {
@@ -238,12 +239,12 @@ TEST_F(UsbIoScan, MoreThanWasAskedForIsRefused) {
     // No driver should report more than a read asked for; where one does, a fixed scan stays within its size.
     const auto instrument = Open();
     const auto scanTooMuch = [&] {
-        driver.Script(BulkInEndpoint, {.data = Bytes(100), .after = 1, .count = 101});
+        driver_.Script(BulkInEndpoint, {.data = Bytes(100), .after = 1, .count = 101});
         instrument->StartScan(256, 1, 100);
     };
     ExpectThrow<DataException>("buffer size is fix", scanTooMuch);
-    EXPECT_EQ(driver.Running(BulkInEndpoint), 0U);
-    sent = 0;
+    EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
+    sent_ = 0;
     Send({5000, 0}, 1);
     instrument->StartScan(256, 1, 5000);
     // Now there would be room for it.

@@ -20,21 +20,21 @@ using UsbIoCommands = UsbIoTest;
 TEST_F(UsbIoCommands, GiveShortAnswersAsTheyCame) {
     const auto instrument = Open();
     Bytes2 value{};
-    driver.Script(Control::ClassOrVendorInRequest, {.data = {31, 32}, .after = 1});
+    driver_.Script(Control::ClassOrVendorInRequest, {.data = {31, 32}, .after = 1});
     instrument->ReadCPLD(value);
-    driver.Script(Control::ClassOrVendorInRequest, {.data = {0x77}, .after = 1});
+    driver_.Script(Control::ClassOrVendorInRequest, {.data = {0x77}, .after = 1});
     instrument->ReadCPLD(value);
     EXPECT_THAT(value, ElementsAre(0x77, 0)) << "zeros, not what an earlier command had";
 
     Bytes buffer(5, 0xEE);
-    driver.Script(BulkInEndpoint, {.data = {9, 8, 7}, .after = 3});
+    driver_.Script(BulkInEndpoint, {.data = {9, 8, 7}, .after = 3});
     instrument->MeasureRequest(buffer.data(), 4, 1);
     EXPECT_THAT(buffer, ElementsAre(9, 8, 7, 0xEE, 0xEE));
 }
 
 TEST_F(UsbIoCommands, HaveTimeoutsThatDoNotWrap) {
     const auto instrument = Open();
-    driver.Script(BulkInEndpoint, {.data = {1}, .after = 200});
+    driver_.Script(BulkInEndpoint, {.data = {1}, .after = 200});
     std::uint8_t byte = 0;
     instrument->MeasureRequest(&byte, 1,
                                4294963);  // * 1000 + 5000 is 32 bits wide and a few milliseconds more
@@ -42,13 +42,13 @@ TEST_F(UsbIoCommands, HaveTimeoutsThatDoNotWrap) {
 }
 
 TEST_F(UsbIoCommands, WriteWithoutALimit) {
-    if (!clock.IsVirtual()) {
+    if (!clock_.IsVirtual()) {
         GTEST_SKIP() << "takes minutes in real time";
     }
     const auto instrument = Open();
-    driver.Script(Protocol::BulkOutEndpoint, {.after = 60'000});
-    driver.Script(Protocol::BulkOutEndpoint, {.after = 120'000});
-    const Stopwatch watch(clock);
+    driver_.Script(Protocol::BulkOutEndpoint, {.after = 60'000});
+    driver_.Script(Protocol::BulkOutEndpoint, {.after = 120'000});
+    const Stopwatch watch(clock_);
     const std::uint8_t byte = 7;
     EXPECT_NO_THROW(instrument->WriteEEPROM({}, {}, &byte, 1));
     watch.Expect(1 + 60'000 + 120'000);
@@ -81,7 +81,7 @@ TEST_F(UsbIoOpening, ConfiguresTheInstrumentThatWasAskedFor) {
                      "open usbio/2", ask, "control 80942078 84 /"});
     PellandoFunctionality_Win64 instrument(nullptr, 1);
     EXPECT_THAT(TakeTranscript(), ElementsAreArray(expected));
-    EXPECT_EQ(driver.OpenFiles(), 4U);
+    EXPECT_EQ(driver_.OpenFiles(), 4U);
     std::string identifier;
     instrument.GetDeviceIdentifier(identifier);
     EXPECT_EQ(identifier, "usbio/2");
@@ -97,9 +97,9 @@ TEST_F(UsbIoOpening, FailsWithoutTheInstrument) {
     // The search stops at the first device that does not open.
     const auto failOpen = [this](int after) {
         for (int i = 0; i < after; ++i) {
-            driver.Script(Control::GetDriverInfo, {.data = {0x30, 0x02}});
+            driver_.Script(Control::GetDriverInfo, {.data = {0x30, 0x02}});
         }
-        driver.Script(Control::GetDriverInfo, {.code = 31});
+        driver_.Script(Control::GetDriverInfo, {.code = 31});
     };
     failOpen(3);
     ExpectFailure("requested device not found", 1);
@@ -144,13 +144,13 @@ TEST_F(UsbIoOpening, EachStepOfTheConfigurationCanFail) {
     };
     for (const Case& row : cases) {
         for (int i = 0; i < row.before; ++i) {
-            driver.Script(row.code, {});
+            driver_.Script(row.code, {});
         }
-        driver.Script(row.code, {.code = Status::AlreadyConfigured});
+        driver_.Script(row.code, {.code = Status::AlreadyConfigured});
         ExpectFailure(std::string("Error in UsbIo function: \"") + row.operation +
                           "\" Error: Error code 0xE0001005: USB device is already configured.",
                       0);
-        EXPECT_EQ(driver.OpenFiles(), 0U) << row.operation;
+        EXPECT_EQ(driver_.OpenFiles(), 0U) << row.operation;
     }
     Platform::InstallCallFilter([](std::string_view call) {
         return call == "StartThread" ? Platform::Errors::NoSystemResources : 0;

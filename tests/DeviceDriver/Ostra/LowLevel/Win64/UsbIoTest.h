@@ -18,19 +18,19 @@ class UsbIoTest : public DriverTest {
     }
     ~UsbIoTest() override {
         Platform::Override64BitHost(std::nullopt);
-        EXPECT_EQ(driver.OpenFiles(), 0U);
+        EXPECT_EQ(driver_.OpenFiles(), 0U);
     }
 
     /// Opens the first instrument and forgets what that took.
     std::unique_ptr<DeviceDriver::Ostra::LowLevel::PellandoFunctionality_Win64> Open() {
         auto opened =
             std::make_unique<DeviceDriver::Ostra::LowLevel::PellandoFunctionality_Win64>(nullptr, 0);
-        driver.TakeTranscript();
+        driver_.TakeTranscript();
         return opened;
     }
     /// What happened since the last call, without the interrupt listener's reads.
     Lines TakeTranscript() {
-        Lines lines = driver.TakeTranscript();
+        Lines lines = driver_.TakeTranscript();
         std::erase_if(lines, [](const std::string& line) {
             return line.starts_with("read 84") || line.starts_with("cancel 84");
         });
