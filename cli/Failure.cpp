@@ -12,6 +12,7 @@
 #include "Protocol/UsbIoDriver.h"
 #include "SystemCommands.h"
 #include "Utilities/Exceptions/Exceptions.h"
+#include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -91,6 +92,8 @@ FailureReport Describe(const std::exception_ptr& failure) {
         std::rethrow_exception(failure);
     } catch (const ToolFailure& exception) {
         return {exception.Code(), exception.what(), exception.Advice()};
+    } catch (const Utilities::Files::FileError& exception) {
+        return {ExitCode::File, exception.what(), exception.Advice()};
     } catch (const TimeoutException& exception) {
         // A transfer that a removed instrument cannot even begin is reported as a wait that failed.
         FailureReport report = OfTransfer(exception);

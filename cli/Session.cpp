@@ -6,6 +6,7 @@
 #include "Instrument.h"
 #include "Output/Json.h"
 #include "SystemCommands.h"
+#include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -132,6 +133,8 @@ FailureReport Session::Explain(const std::exception_ptr& failure) const {
     try {
         std::rethrow_exception(failure);
     } catch (const ToolFailure&) {
+        isOwn = true;
+    } catch (const Utilities::Files::FileError&) {
         isOwn = true;
     } catch (...) {  // the library's: its text says nothing of which instrument
     }

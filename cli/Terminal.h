@@ -36,9 +36,6 @@ void SetStandardOutputBinary();
 /// A file's name as a command line takes it, whatever it begins with and holds.
 std::string QuotedFileName(const std::string& name);
 
-/// Returns when the file's content has reached the disk, as far as the system can tell. False on failure.
-bool SyncToDisk(const std::string& path);
-
 /// Ctrl-C and the signals that ask a process to end, turned into calls of a function on a thread of its own.
 /// Made before any other thread, on the main thread. From the second signal on the process ends at once, as
 /// it would without this.

@@ -107,16 +107,6 @@ std::string QuotedFileName(const std::string& name) {
     return quoted + "'";
 }
 
-bool SyncToDisk(const std::string& path) {
-    const int file = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
-    if (file < 0) {
-        return false;
-    }
-    const bool synced = ::fsync(file) == 0;
-    ::close(file);
-    return synced;
-}
-
 /// The signals are blocked in every thread and taken by one that waits for them: what it then calls may take
 /// locks, which a signal handler may not.
 struct SignalWatch::State {

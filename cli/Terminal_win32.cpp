@@ -60,17 +60,6 @@ std::string QuotedFileName(const std::string& name) {
     return isPlain ? file : '"' + file + '"';
 }
 
-bool SyncToDisk(const std::string& path) {
-    const HANDLE file = ::CreateFileA(path.c_str(), GENERIC_WRITE, FILE_SHARE_READ | FILE_SHARE_WRITE,
-                                      nullptr, OPEN_EXISTING, 0, nullptr);
-    if (file == INVALID_HANDLE_VALUE) {
-        return false;
-    }
-    const bool synced = ::FlushFileBuffers(file) != 0;
-    ::CloseHandle(file);
-    return synced;
-}
-
 /// The console calls its handler on a thread of its own.
 struct SignalWatch::State {
     std::function<void()> callback;

@@ -5,11 +5,11 @@
 
 #include "Commands/CommonOptions.h"
 #include "Commands/Eeprom.h"
-#include "Memory/ByteSource.h"
 #include "Memory/ImageCheck.h"
 #include "Memory/ImageDiff.h"
 #include "Memory/ImageEdit.h"
 #include "Memory/ImageModel.h"
+#include "Memory/InputFile.h"
 #include "Memory/MemoryTarget.h"
 #include "Output/Json.h"
 #include "Output/Table.h"

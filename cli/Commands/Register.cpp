@@ -11,8 +11,8 @@
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
 #include "Linux/UdevRule.h"
-#include "Output/AtomicFile.h"
 #include "Output/Json.h"
+#include "Utilities/Files/AtomicFile.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -49,7 +49,7 @@ void ChangeRules(const Options& options, const std::string& rules) {
         }
         return;
     }
-    AtomicFile file(options.file);
+    Utilities::Files::AtomicFile file(options.file);
     file.Stream() << rules;
     file.Commit();
 }

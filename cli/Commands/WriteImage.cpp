@@ -2,8 +2,8 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
-#include "Memory/ByteSource.h"
 #include "Memory/EepromWrite.h"
+#include "Memory/InputFile.h"
 #include "Output/Json.h"
 #include "Protocol/Instrument.h"
 

@@ -5,7 +5,7 @@
 #include <vector>
 
 #include "Instrument.h"
-#include "Memory/EepromFile.h"
+#include "Memory/InputFile.h"
 
 namespace Varnholt::Cli {
 

@@ -3,7 +3,7 @@
 #include <string>
 #include <vector>
 
-#include "Memory/EepromFile.h"
+#include "Memory/InputFile.h"
 
 namespace Varnholt::Cli {
 

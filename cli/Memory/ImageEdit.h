@@ -4,7 +4,7 @@
 #include <span>
 #include <vector>
 
-#include "Memory/EepromFile.h"
+#include "Memory/InputFile.h"
 #include "Memory/PropertyText.h"
 
 namespace Varnholt::Cli {

@@ -4,7 +4,7 @@
 #include <optional>
 
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
-#include "Memory/EepromFile.h"
+#include "Memory/InputFile.h"
 
 namespace Varnholt::Cli {
 

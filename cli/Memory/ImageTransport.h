@@ -1,7 +1,7 @@
 #pragma once
 
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionalityByte.h"
-#include "Memory/EepromFile.h"
+#include "Memory/InputFile.h"
 
 namespace Varnholt::Cli {
 

@@ -6,15 +6,19 @@
 #include <ostream>
 
 #include "Commands/CommonOptions.h"
-#include "Memory/ByteSource.h"
 #include "Memory/ImageCheck.h"
-#include "Output/AtomicFile.h"
+#include "Memory/InputFile.h"
 #include "Output/Json.h"
 #include "Platform/Time.h"
 #include "Terminal.h"
+#include "Utilities/Files/AtomicFile.h"
+#include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Cli {
 namespace {
+
+using Utilities::Files::AtomicFile;
+using Utilities::Files::WriteFileAtomically;
 
 /// What is read once and then written could be two different things.
 void RefuseToChangeInPlace(const std::string& file) {
@@ -128,9 +132,9 @@ std::string MemoryTarget::MakeBackup(const ChangeOptions& options) {
         backup = NewBackupName(name_, instrument_->ChipId());
         try {
             WriteFileAtomically(backup, image_, AtomicFile::IfItExists::Refuse);
-        } catch (const ToolFailure& failure) {
+        } catch (const Utilities::Files::FileError& failure) {
             throw ToolFailure(
-                failure.Code(),
+                ExitCode::File,
                 std::string("no backup can be made in the current folder, and nothing was changed: ") +
                     failure.what(),
                 "--backup FILE makes it elsewhere; --no-backup leaves it out");

@@ -2,11 +2,13 @@
 
 #include <filesystem>
 
-#include "Memory/ByteSource.h"
-#include "Output/AtomicFile.h"
+#include "Memory/InputFile.h"
 #include "Session.h"
+#include "Utilities/Files/AtomicFile.h"
 
 namespace Varnholt::Cli {
+
+using Utilities::Files::AtomicFile;
 
 void AddNewFileOptions(CommandSpec command, const char* names, NewFileOptions& options) {
     command.Add(names, options.name, "must not exist; `-` is standard output").Type("FILE").Required();
@@ -31,8 +33,9 @@ void NewFile::Write(std::span<const std::uint8_t> content) const {
     if (isStandardOutput_) {
         session_.WriteClaimedOut(content);
     } else {
-        WriteFileAtomically(options_.name, content,
-                            replaces_ ? AtomicFile::IfItExists::Replace : AtomicFile::IfItExists::Refuse);
+        Utilities::Files::WriteFileAtomically(
+            options_.name, content,
+            replaces_ ? AtomicFile::IfItExists::Replace : AtomicFile::IfItExists::Refuse);
     }
 }
 

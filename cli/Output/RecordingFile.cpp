@@ -1,14 +1,16 @@
 #include "Output/RecordingFile.h"
 
-#include "Failure.h"
+#include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Cli {
 namespace {
 
-namespace Files = std::filesystem;
+using std::filesystem::path;
+using Utilities::Files::FileError;
+using Utilities::Files::FinalName;
 
-Files::path PartialFor(const FinalName& name) {
-    Files::path partial;
+path PartialFor(const FinalName& name) {
+    path partial;
     if (name.CanBeReplaced()) {
         partial = name.Path();
         partial += ".part";
@@ -30,10 +32,8 @@ OutputDescriptor RecordingFile::Open() {
                                   ? OutputDescriptor::Open(finalName_.Shown(), interruption_, error)
                                   : OutputDescriptor::Create(partial_.string(), error);
     if (error == std::errc::file_exists) {
-        throw ToolFailure(
-            ExitCode::File,
-            partial_.string() + " exists: another run writes it, or one that was killed left it",
-            "it holds what that run recorded; move it away, or remove it, and try again");
+        throw FileError(partial_.string() + " exists: another run writes it, or one that was killed left it",
+                        "it holds what that run recorded; move it away, or remove it, and try again");
     }
     if (error == std::errc::operation_canceled) {
         interruption_.ThrowIfRequested();
@@ -95,7 +95,7 @@ RecordOutput::Remains RecordingFile::KeepWholeRecords() {
             return {finalName_.Shown(), {}};
         }
         return {partial_.string(), finalName_.Shown()};  // somebody was faster
-    } catch (const ToolFailure&) {
+    } catch (const FileError&) {
         return {partial_.string(), {}};
     }
 }
@@ -105,7 +105,7 @@ void RecordingFile::Discard() {
     descriptor_.Close();
     if (!partial_.empty()) {
         std::error_code ignored;
-        Files::remove(partial_, ignored);
+        std::filesystem::remove(partial_, ignored);
     }
 }
 

@@ -3,9 +3,9 @@
 #include <filesystem>
 #include <optional>
 
-#include "Output/FinalName.h"
 #include "Output/OutputDescriptor.h"
 #include "Output/RecordOutput.h"
+#include "Utilities/Files/FinalName.h"
 
 namespace Varnholt::Cli {
 
@@ -29,7 +29,7 @@ class RecordingFile final : public RecordOutput {
     [[noreturn]] void Fail(std::error_code error) const override;
     OutputDescriptor Open();
 
-    const FinalName finalName_;
+    const Utilities::Files::FinalName finalName_;
     const Interruption& interruption_;
     const std::filesystem::path partial_;  ///< empty: written directly
     OutputDescriptor descriptor_;

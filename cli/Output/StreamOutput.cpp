@@ -3,7 +3,7 @@
 #include <cerrno>
 #include <ostream>
 
-#include "Failure.h"
+#include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Cli {
 
@@ -26,7 +26,7 @@ RecordOutput::Taken StreamOutput::Take(std::span<const char> block) {
 }
 
 void StreamOutput::Fail(std::error_code error) const {
-    throw ToolFailure(ExitCode::File, "the output cannot be written: " + error.message());
+    throw Utilities::Files::FileError("the output cannot be written: " + error.message());
 }
 
 }  // namespace Varnholt::Cli

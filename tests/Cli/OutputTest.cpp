@@ -14,7 +14,6 @@
 #include <thread>
 
 #include "Failure.h"
-#include "Output/AtomicFile.h"
 #include "Output/Json.h"
 #include "Output/LiveBlock.h"
 #include "Output/Plot.h"
@@ -24,11 +23,14 @@
 #include "Output/WallTimeText.h"
 #include "Support/ExpectThrow.h"
 #include "ToolFixture.h"
+#include "Utilities/Files/AtomicFile.h"
+#include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Tests {
 namespace {
 
 using namespace Cli;
+using namespace Varnholt::Utilities::Files;
 
 TEST(TableTest, ColumnsAreAsWideAsTheirWidestCellAndLinesEndWithoutBlanks) {
     Table table({{"NAME"}, {"VALUE", Table::Align::Right}, {"NOTE"}});
@@ -204,10 +206,10 @@ TEST_F(AtomicFileTest, TakesItsNameWhenItIsComplete) {
 
 TEST_F(AtomicFileTest, RefusesWhatExistsWhereThatIsWanted) {
     WriteFile(path_, before_);
-    EXPECT_THROW(AtomicFile(path_, AtomicFile::IfItExists::Refuse), ToolFailure);
+    EXPECT_THROW(AtomicFile(path_, AtomicFile::IfItExists::Refuse), FileError);
     AtomicFile file(folder_.Path("new"), AtomicFile::IfItExists::Refuse);
     WriteFile(folder_.Path("new"), before_);  // somebody was faster
-    EXPECT_THROW(file.Commit(), ToolFailure);
+    EXPECT_THROW(file.Commit(), FileError);
     EXPECT_EQ(ReadFile(folder_.Path("new")), before_);
 }
 
@@ -216,8 +218,7 @@ TEST_F(AtomicFileTest, NamesTheFileThatCannotBeWritten) {
         try {
             AtomicFile file(name);
             FAIL() << name;
-        } catch (const ToolFailure& failure) {
-            EXPECT_EQ(failure.Code(), ExitCode::File);
+        } catch (const FileError& failure) {
             EXPECT_NE(std::string(failure.what()).find(name), std::string::npos) << failure.what();
         }
     }
@@ -280,7 +281,7 @@ TEST_F(RecordingFileTest, Ends) {
         }
         {
             RecordingFile file(folder_.Path("f"), none_);
-            EXPECT_THROW(RecordingFile(folder_.Path("f"), none_), ToolFailure) << "two at once";
+            EXPECT_THROW(RecordingFile(folder_.Path("f"), none_), FileError) << "two at once";
             file.Append(std::string("head,"), 0);
             for (std::uint64_t i = 1; i <= row.records; ++i) {
                 file.Append(std::to_string(i) + ',', 1);
@@ -305,7 +306,7 @@ TEST_F(RecordingFileTest, Ends) {
 
 TEST_F(RecordingFileTest, WhatAKilledRunLeftIsNotTouched) {
     WriteFile(folder_.Path("f.part"), {'k', 'e', 'p', 't'});
-    ExpectThrow<ToolFailure>(
+    ExpectThrow<FileError>(
         folder_.Path("f.part") + " exists: another run writes it, or one that was killed left it",
         [this] { RecordingFile(folder_.Path("f"), none_); });
     EXPECT_EQ(Content("f.part"), "kept");
@@ -361,8 +362,8 @@ TEST_F(RecordingFileTest, AFullDiskLeavesTheWholeRecords) {
         {
             const FullDisk full(14);
             file.Append(std::string("head\n"), 0);
-            ExpectThrow<ToolFailure>("cannot write " + folder_.Path("f") + ": File too large",
-                                     [&] { file.Append(row.block, row.records, row.form); });
+            ExpectThrow<FileError>("cannot write " + folder_.Path("f") + ": File too large",
+                                   [&] { file.Append(row.block, row.records, row.form); });
         }
         EXPECT_EQ(file.Records(), row.kept);
         EXPECT_EQ(file.KeepWholeRecords().file, row.kept > 0 ? folder_.Path("f") : "");
@@ -428,9 +429,8 @@ TEST_F(AtomicFileTest, ALinkStaysAndADeviceIsWrittenTo) {
     WriteFileAtomically("/dev/null", after_);
     EXPECT_TRUE(std::filesystem::is_character_file("/dev/null"));
     for (const std::size_t size : {std::size_t{2}, std::size_t{100'000}}) {  // either way through a buffer
-        ExpectThrow<ToolFailure>("cannot write /dev/full: No space left on device", [size] {
-            WriteFileAtomically("/dev/full", std::vector<std::uint8_t>(size));
-        });
+        ExpectThrow<FileError>("cannot write /dev/full: No space left on device",
+                               [size] { WriteFileAtomically("/dev/full", std::vector<std::uint8_t>(size)); });
     }
 }
 #endif

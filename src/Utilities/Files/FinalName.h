@@ -3,10 +3,10 @@
 #include <filesystem>
 #include <string>
 
-namespace Varnholt::Cli {
+namespace Varnholt::Utilities::Files {
 
 /// The name that a file is to have once it is complete: what may have that name now, and how a file that was
-/// written beside it takes its place. Failures are `ToolFailure` with `ExitCode::File`.
+/// written beside it takes its place. Failures are `FileError`.
 class FinalName final {
   public:
     enum class IfItExists { Replace, Refuse };
@@ -36,4 +36,4 @@ class FinalName final {
     bool isOrdinary_;
 };
 
-}  // namespace Varnholt::Cli
+}  // namespace Varnholt::Utilities::Files

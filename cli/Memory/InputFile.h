@@ -6,6 +6,13 @@
 
 namespace Varnholt::Cli {
 
+/// What stands for standard input or output in the place of a file's name.
+inline constexpr const char* StandardStream = "-";
+/// A file's name as messages say it, where it is read.
+std::string ShownSource(const std::string& name);
+/// ... and as a command line takes it.
+std::string QuotedSource(const std::string& name);
+
 /// The content of an EEPROM, 8192 bytes.
 using EepromImage = std::vector<std::uint8_t>;
 

@@ -1,13 +1,15 @@
-#include "Memory/EepromFile.h"
+#include "Memory/InputFile.h"
 
 #include <filesystem>
 
-#include "Memory/ByteSource.h"
 #include "Protocol/Instrument.h"
 #include "Session.h"
+#include "Utilities/Files/ByteSource.h"
 
 namespace Varnholt::Cli {
 namespace {
+
+using Utilities::Files::ByteSource;
 
 /// Returns when there is something to read.
 void Await(Session& session, ByteSource& source, const std::string& name) {
@@ -30,21 +32,14 @@ std::vector<std::uint8_t> ReadFileUpTo(Session& session, const std::string& name
     } else if (std::filesystem::is_directory(name, error)) {
         throw ToolFailure(ExitCode::File, "cannot read " + name + ": it is a directory");
     }
-    const std::unique_ptr<ByteSource> source = OpenByteSource(name);
+    const std::unique_ptr<ByteSource> source = name == StandardStream
+                                                   ? Utilities::Files::OpenStandardInput()
+                                                   : Utilities::Files::OpenByteSource(name);
     if (source->IsTerminal()) {
         throw ToolFailure(ExitCode::Usage, ShownSource(name) + " is a terminal: nobody types raw bytes",
                           "name a file, or let a pipe bring it");
     }
-    std::vector<std::uint8_t> content(limit + 1);
-    for (std::size_t size = 0; size < content.size();) {
-        Await(session, *source, name);
-        const std::size_t count = source->Read(content.data() + size, content.size() - size);
-        size += count;
-        if (count == 0) {
-            content.resize(size);
-        }
-    }
-    return content;
+    return Utilities::Files::ReadUpTo(*source, limit, [&] { Await(session, *source, name); });
 }
 
 }  // namespace

@@ -1,3 +1,5 @@
+#include "Utilities/Files/ByteSource.h"
+
 #include <fcntl.h>
 #include <poll.h>
 #include <unistd.h>
@@ -5,10 +7,9 @@
 #include <cerrno>
 #include <system_error>
 
-#include "Failure.h"
-#include "Memory/ByteSource.h"
+#include "Utilities/Files/FileError.h"
 
-namespace Varnholt::Cli {
+namespace Varnholt::Utilities::Files {
 namespace {
 
 class Descriptor final : public ByteSource {
@@ -44,8 +45,7 @@ class Descriptor final : public ByteSource {
 
   private:
     [[noreturn]] void Fail() const {
-        throw ToolFailure(ExitCode::File,
-                          "cannot read " + shownName_ + ": " + std::generic_category().message(errno));
+        throw FileError("cannot read " + shownName_ + ": " + std::generic_category().message(errno));
     }
 
     const int descriptor_;
@@ -55,10 +55,12 @@ class Descriptor final : public ByteSource {
 }  // namespace
 
 std::unique_ptr<ByteSource> OpenByteSource(const std::string& name) {
-    const int descriptor = name == StandardStream
-                               ? ::fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, 0)
-                               : ::open(name.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC);
-    return std::make_unique<Descriptor>(descriptor, ShownSource(name));
+    return std::make_unique<Descriptor>(::open(name.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC),
+                                        name);
 }
 
-}  // namespace Varnholt::Cli
+std::unique_ptr<ByteSource> OpenStandardInput() {
+    return std::make_unique<Descriptor>(::fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, 0), "standard input");
+}
+
+}  // namespace Varnholt::Utilities::Files

@@ -1,11 +1,11 @@
-#include "Output/FinalName.h"
+#include "Utilities/Files/FinalName.h"
 
 #include <system_error>
 
-#include "Failure.h"
-#include "Terminal.h"
+#include "Utilities/Files/FileError.h"
+#include "Utilities/Files/SyncToDisk.h"
 
-namespace Varnholt::Cli {
+namespace Varnholt::Utilities::Files {
 namespace {
 
 namespace Files = std::filesystem;
@@ -34,7 +34,7 @@ FinalName::FinalName(const std::string& name) : shownName_(name), target_(name) 
     existed_ = Files::exists(status);
     isOrdinary_ = !existed_ || Files::is_regular_file(status);
     if (Files::is_directory(status)) {
-        throw ToolFailure(ExitCode::File, name + " is a directory", "name a file");
+        throw FileError(name + " is a directory", "name a file");
     }
     if (isOrdinary_) {
         if (const Files::path real = Files::canonical(target_, error); !error) {
@@ -64,8 +64,8 @@ bool FinalName::Give(const Files::path& partial, IfItExists policy) const {
 }
 
 void FinalName::Fail(const std::string& what) const {
-    throw ToolFailure(ExitCode::File, "cannot write " + shownName_ + ": " + what,
-                      "check the folder, its permissions and the free space");
+    throw FileError("cannot write " + shownName_ + ": " + what,
+                    "check the folder, its permissions and the free space");
 }
 
-}  // namespace Varnholt::Cli
+}  // namespace Varnholt::Utilities::Files

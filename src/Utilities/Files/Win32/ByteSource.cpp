@@ -1,12 +1,13 @@
+#include "Utilities/Files/ByteSource.h"
+
 #include <windows.h>
 
 #include <algorithm>
 #include <system_error>
 
-#include "Failure.h"
-#include "Memory/ByteSource.h"
+#include "Utilities/Files/FileError.h"
 
-namespace Varnholt::Cli {
+namespace Varnholt::Utilities::Files {
 namespace {
 
 class File final : public ByteSource {
@@ -59,8 +60,7 @@ class File final : public ByteSource {
   private:
     [[noreturn]] void Fail() const {
         const auto code = static_cast<int>(::GetLastError());
-        throw ToolFailure(ExitCode::File,
-                          "cannot read " + shownName_ + ": " + std::system_category().message(code));
+        throw FileError("cannot read " + shownName_ + ": " + std::system_category().message(code));
     }
 
     const HANDLE file_;
@@ -71,12 +71,14 @@ class File final : public ByteSource {
 }  // namespace
 
 std::unique_ptr<ByteSource> OpenByteSource(const std::string& name) {
-    const bool isStandard = name == StandardStream;
-    const HANDLE file = isStandard
-                            ? ::GetStdHandle(STD_INPUT_HANDLE)
-                            : ::CreateFileA(name.c_str(), GENERIC_READ, FILE_SHARE_READ | FILE_SHARE_WRITE,
-                                            nullptr, OPEN_EXISTING, 0, nullptr);
-    return std::make_unique<File>(file, !isStandard, ShownSource(name));
+    return std::make_unique<File>(
+        ::CreateFileA(name.c_str(), GENERIC_READ, FILE_SHARE_READ | FILE_SHARE_WRITE, nullptr, OPEN_EXISTING,
+                      0, nullptr),
+        true, name);
 }
 
-}  // namespace Varnholt::Cli
+std::unique_ptr<ByteSource> OpenStandardInput() {
+    return std::make_unique<File>(::GetStdHandle(STD_INPUT_HANDLE), false, "standard input");
+}
+
+}  // namespace Varnholt::Utilities::Files

@@ -6,15 +6,15 @@
 #include <span>
 #include <string>
 
-#include "Output/FinalName.h"
+#include "Utilities/Files/FinalName.h"
 
-namespace Varnholt::Cli {
+namespace Varnholt::Utilities::Files {
 
 /// A file that takes its name only when it is complete: until `Commit` the content is in a file beside it,
 /// which is gone if that never comes. What had the name before stays whole till then. A name that is no
 /// ordinary file (a device, a pipe) is written to directly.
 ///
-/// Failures are `ToolFailure` with `ExitCode::File`.
+/// Failures are `FileError`.
 class AtomicFile final {
   public:
     using IfItExists = FinalName::IfItExists;
@@ -25,6 +25,9 @@ class AtomicFile final {
     AtomicFile& operator=(const AtomicFile&) = delete;
 
     std::ostream& Stream() { return stream_; }
+    void Write(std::span<const std::uint8_t> content);
+    /// Returns when the content is on the disk, beside the name that it is to take.
+    void Prepare();
     /// Returns when the content is on the disk under its name.
     void Commit();
 
@@ -41,4 +44,4 @@ class AtomicFile final {
 void WriteFileAtomically(const std::string& name, std::span<const std::uint8_t> content,
                          AtomicFile::IfItExists policy = AtomicFile::IfItExists::Replace);
 
-}  // namespace Varnholt::Cli
+}  // namespace Varnholt::Utilities::Files

@@ -1,13 +1,13 @@
-#include "Output/AtomicFile.h"
+#include "Utilities/Files/AtomicFile.h"
 
 #include <cerrno>
 #include <random>
 #include <system_error>
 
-#include "Failure.h"
-#include "Terminal.h"
+#include "Utilities/Files/FileError.h"
+#include "Utilities/Files/SyncToDisk.h"
 
-namespace Varnholt::Cli {
+namespace Varnholt::Utilities::Files {
 namespace {
 
 namespace Files = std::filesystem;
@@ -44,7 +44,12 @@ AtomicFile::~AtomicFile() {
     }
 }
 
-void AtomicFile::Commit() {
+void AtomicFile::Write(std::span<const std::uint8_t> content) {
+    stream_.write(reinterpret_cast<const char*>(content.data()),
+                  static_cast<std::streamsize>(content.size()));
+}
+
+void AtomicFile::Prepare() {
     if (stream_) {
         errno = 0;
         stream_.close();
@@ -52,29 +57,29 @@ void AtomicFile::Commit() {
     if (!stream_) {  // it may have failed before: then the reason is still that of the write
         finalName_.Fail(ReasonOfLastFailure());
     }
-    if (!partial_.empty()) {
-        errno = 0;
-        if (!SyncToDisk(partial_.string())) {
-            finalName_.Fail(ReasonOfLastFailure());
-        }
-        if (!finalName_.Give(partial_, ifItExists_)) {
-            FailAsItExists();
-        }
+    errno = 0;
+    if (!partial_.empty() && !SyncToDisk(partial_.string())) {
+        finalName_.Fail(ReasonOfLastFailure());
+    }
+}
+
+void AtomicFile::Commit() {
+    Prepare();
+    if (!partial_.empty() && !finalName_.Give(partial_, ifItExists_)) {
+        FailAsItExists();
     }
     committed_ = true;
 }
 
 void AtomicFile::FailAsItExists() const {
-    throw ToolFailure(ExitCode::File, finalName_.Shown() + " exists already",
-                      "name a file that does not exist yet");
+    throw FileError(finalName_.Shown() + " exists already", "name a file that does not exist yet");
 }
 
 void WriteFileAtomically(const std::string& name, std::span<const std::uint8_t> content,
                          AtomicFile::IfItExists policy) {
     AtomicFile file(name, policy);
-    file.Stream().write(reinterpret_cast<const char*>(content.data()),
-                        static_cast<std::streamsize>(content.size()));
+    file.Write(content);
     file.Commit();
 }
 
-}  // namespace Varnholt::Cli
+}  // namespace Varnholt::Utilities::Files
