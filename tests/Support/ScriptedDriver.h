@@ -13,7 +13,7 @@
 
 #include "Platform/DeviceFiles.h"
 #include "Platform/EventScheduler.h"
-#include "Support/Exchange.h"
+#include "Support/Bytes.h"
 
 namespace Varnholt::Tests {
 

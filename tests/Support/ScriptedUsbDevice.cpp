@@ -9,12 +9,75 @@
 namespace Varnholt::Tests {
 
 using Platform::ErrorCode;
+using Platform::Usb::SetupPacket;
 using Platform::Usb::Transfer;
 using Platform::Usb::TransferStatus;
 namespace Errors = Platform::Errors;
 
-ScriptedUsbDevice::ScriptedUsbDevice(std::vector<Exchange> rows)
-    : script_(std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end())) {}
+namespace {
+
+std::string Describe(std::uint8_t endpoint, const SetupPacket& setup, bool isIn, const std::uint8_t* data,
+                     std::uint32_t length) {
+    std::string text = Hex(&endpoint, 1);
+    if (endpoint == 0) {
+        const auto low = [](std::uint16_t number) { return static_cast<std::uint8_t>(number); };
+        const auto high = [](std::uint16_t number) { return static_cast<std::uint8_t>(number >> 8U); };
+        const std::uint8_t bytes[] = {setup.requestType, setup.request,     low(setup.value),
+                                      high(setup.value), low(setup.index),  high(setup.index),
+                                      low(setup.length), high(setup.length)};
+        text += " setup " + Hex(bytes, sizeof bytes);
+    }
+    return text + " length " + std::to_string(length) + (isIn ? "" : " data " + Hex(data, length));
+}
+
+Exchange Out(std::uint8_t endpoint, const SetupPacket& setup, const Bytes& data) {
+    const auto length = static_cast<std::uint32_t>(data.size());
+    Exchange row;
+    row.expected = Describe(endpoint, setup, false, data.data(), length);
+    row.moved = length;
+    return row;
+}
+
+Exchange In(std::uint8_t endpoint, const SetupPacket& setup, std::uint32_t length, Bytes answer) {
+    Exchange row;
+    row.expected = Describe(endpoint, setup, true, nullptr, length);
+    row.moved = std::min(length, static_cast<std::uint32_t>(answer.size()));
+    row.received = std::move(answer);
+    return row;
+}
+
+}  // namespace
+
+Exchange ControlOut(const SetupPacket& setup, const Bytes& data) {
+    return Out(0, setup, data);
+}
+
+Exchange VendorOut(std::uint8_t request, const Bytes& data, std::uint16_t value, std::uint16_t index) {
+    return ControlOut({Protocol::VendorOut, request, value, index, static_cast<std::uint16_t>(data.size())},
+                      data);
+}
+
+Exchange VendorIn(std::uint8_t request, std::uint16_t length, Bytes answer) {
+    return In(0, {Protocol::VendorIn, request, 0, 0, length}, length, std::move(answer));
+}
+
+Exchange BulkOut(const Bytes& data) {
+    return Out(Protocol::BulkOutEndpoint, {}, data);
+}
+
+Exchange BulkIn(std::uint32_t length, Bytes answer, std::uint8_t endpoint) {
+    return In(endpoint, {}, length, std::move(answer));
+}
+
+Exchange HaltCleared(std::uint8_t endpoint) {
+    Exchange row;
+    row.expected = "clear halt of " + Hex(&endpoint, 1);
+    return row;
+}
+
+ScriptedUsbDevice::ScriptedUsbDevice(std::vector<Exchange> rows) {
+    Expect(std::move(rows));
+}
 
 ScriptedUsbDevice::~ScriptedUsbDevice() {
     for (const std::uint64_t event : events_) {
@@ -23,13 +86,13 @@ ScriptedUsbDevice::~ScriptedUsbDevice() {
     Unplug();
     if (!script_.empty() && !failed_) {
         ADD_FAILURE() << script_.size() << " rows of the script were not played; the next, row " << played_
-                      << ":\n  expected: " << script_.front().Describe();
+                      << ":\n  expected: " << script_.front().expected;
     }
 }
 
 void ScriptedUsbDevice::Expect(std::vector<Exchange> rows) {
     const std::lock_guard guard(lock_);
-    script_.insert(script_.end(), std::make_move_iterator(rows.begin()), std::make_move_iterator(rows.end()));
+    std::ranges::move(rows, std::back_inserter(script_));
 }
 
 void ScriptedUsbDevice::LeaveToTest(std::uint8_t endpoint) {
@@ -38,19 +101,19 @@ void ScriptedUsbDevice::LeaveToTest(std::uint8_t endpoint) {
 }
 
 void ScriptedUsbDevice::Send(std::uint8_t endpoint, Bytes data) {
+    std::uint64_t number = 0;
     {
         const std::lock_guard guard(lock_);
-        const auto oldest = std::ranges::find_if(running_, [endpoint](const Running& candidate) {
-            return candidate.transfer->endpoint == endpoint && !candidate.ready;
-        });
+        const auto oldest = std::ranges::find(
+            running_, endpoint, [](const Running& candidate) { return candidate.transfer->endpoint; });
         if (oldest == running_.end()) {
-            unsent_.emplace_back(endpoint, std::move(data));
+            unsent_[endpoint] = std::move(data);
             return;
         }
         oldest->row = BulkIn(oldest->transfer->length, std::move(data), endpoint);
-        oldest->ready = true;
+        number = oldest->number;
     }
-    CompleteReady(endpoint);
+    Complete(number);
 }
 
 void ScriptedUsbDevice::Unplug() {
@@ -72,9 +135,9 @@ std::size_t ScriptedUsbDevice::Pending(std::uint8_t endpoint) const {
         running_, endpoint, [](const Running& candidate) { return candidate.transfer->endpoint; }));
 }
 
-std::vector<Platform::Usb::EndpointInfo> ScriptedUsbDevice::Endpoints(Platform::ErrorCode& error) {
-    error = Get(endpointsAnswer_);
-    if (error != Platform::Errors::Success) {
+std::vector<Platform::Usb::EndpointInfo> ScriptedUsbDevice::Endpoints(ErrorCode& error) {
+    error = endpointsAnswer_;
+    if (error != Errors::Success) {
         return {};
     }
     return {{Protocol::BulkOutEndpoint, 2, 512},
@@ -84,21 +147,15 @@ std::vector<Platform::Usb::EndpointInfo> ScriptedUsbDevice::Endpoints(Platform::
 
 ErrorCode ScriptedUsbDevice::Claim() {
     const std::lock_guard guard(lock_);
-    const ErrorCode answer = gone_ ? Errors::DeviceNotConnected : claimAnswer_;
+    const ErrorCode answer = gone_ ? Errors::DeviceNotConnected : claimAnswer_.load();
     if (answer == Errors::Success) {
-        claimed_ = true;
+        isClaimed_ = true;
         ++timesClaimed_;
     }
     return answer;
 }
 
-void ScriptedUsbDevice::Release() {
-    const std::lock_guard guard(lock_);
-    claimed_ = false;
-}
-
 ErrorCode ScriptedUsbDevice::Submit(Transfer& transfer) {
-    const std::uint8_t endpoint = transfer.endpoint;
     std::uint64_t number = 0;
     std::uint64_t delay = 0;
     {
@@ -106,34 +163,24 @@ ErrorCode ScriptedUsbDevice::Submit(Transfer& transfer) {
         if (gone_) {
             return Errors::DeviceNotConnected;
         }
-        number = ++lastNumber_;
-        Running submitted{number, &transfer, {}, false, false};
-        if (leftToTest_.contains(endpoint)) {
-            const auto waiting =
-                std::ranges::find(unsent_, endpoint, [](const auto& sent) { return sent.first; });
-            if (waiting == unsent_.end()) {
-                delay = Exchange::Never;
-            } else {
-                submitted.row = BulkIn(transfer.length, std::move(waiting->second), endpoint);
-                unsent_.erase(waiting);
-            }
-        } else if (script_.empty() || !Matches(script_.front(), transfer)) {
-            Mismatch(Describe(transfer));
-            submitted.row.status = TransferStatus::Stalled;
+        Exchange row;
+        if (!leftToTest_.contains(transfer.endpoint)) {
+            row = TakeRow(
+                Describe(transfer.endpoint, transfer.setup, transfer.IsIn(), transfer.data, transfer.length));
+        } else if (auto sent = unsent_.extract(transfer.endpoint)) {
+            row = BulkIn(transfer.length, std::move(sent.mapped()), transfer.endpoint);
         } else {
-            submitted.row = std::move(script_.front());
-            script_.pop_front();
-            ++played_;
-            if (submitted.row.refusal != Errors::Success) {
-                return submitted.row.refusal;
-            }
-            delay = submitted.row.delay;
+            row = row.OnDemand();
         }
-        submitted.ready = delay == 0;
-        running_.push_back(std::move(submitted));
+        if (row.refusal != Errors::Success) {
+            return row.refusal;
+        }
+        number = ++lastNumber_;
+        delay = row.delay;
+        running_.push_back({number, &transfer, std::move(row)});
     }
     if (delay == 0) {
-        CompleteReady(endpoint);
+        Complete(number);
     } else if (delay != Exchange::Never) {
         CompleteLater(number, delay);
     }
@@ -141,128 +188,72 @@ ErrorCode ScriptedUsbDevice::Submit(Transfer& transfer) {
 }
 
 void ScriptedUsbDevice::Cancel(Transfer& transfer) {
-    const std::uint8_t endpoint = transfer.endpoint;
-    Running ended{};
-    bool later = false;
+    std::uint64_t number = 0;
     {
         const std::lock_guard guard(lock_);
-        const auto found = std::ranges::find_if(running_, [&transfer](const Running& candidate) {
-            return candidate.transfer == &transfer && !candidate.cancelled;
-        });
-        if (found == running_.end()) {
+        const auto found = std::ranges::find(running_, &transfer, &Running::transfer);
+        if (found == running_.end() || found->isCancelled) {
             return;
         }
         found->row = found->row.Ends(TransferStatus::Cancelled, found->row.movedWhenCancelled);
-        found->cancelled = true;
-        ended = *found;
-        later = cancelLater_;
-        if (!later) {
-            running_.erase(found);
-        }
+        found->isCancelled = true;
+        number = found->number;
     }
-    if (later) {
-        CompleteLater(ended.number, 0);
-    } else {
-        Finish(ended);
-        CompleteReady(endpoint);
-    }
+    cancelLater_ ? CompleteLater(number, 0) : Complete(number);
 }
 
 ErrorCode ScriptedUsbDevice::ClearHalt(std::uint8_t endpoint) {
     const std::lock_guard guard(lock_);
-    if (gone_) {
-        return Errors::DeviceNotConnected;
-    }
-    if (script_.empty() || script_.front().kind != Exchange::Kind::ClearHalt ||
-        script_.front().endpoint != endpoint) {
-        Mismatch(HaltCleared(endpoint).Describe());
-        return Errors::Success;
-    }
-    const ErrorCode answer = script_.front().refusal;
-    script_.pop_front();
-    ++played_;
-    if (answer == Errors::Success) {
-        halted_.erase(endpoint);
-    }
-    return answer;
+    return gone_ ? Errors::DeviceNotConnected : TakeRow(HaltCleared(endpoint).expected).refusal;
 }
 
 std::shared_ptr<Platform::Usb::UsbDevice> ScriptedUsbDevice::OpenHandle(
     const std::shared_ptr<ScriptedUsbDevice>& device) {
-    const std::lock_guard guard(device->lock_);
     ++device->handles_;
     ++device->timesOpened_;
     return {device.get(), [device](Platform::Usb::UsbDevice*) {
                 const std::lock_guard closing(device->lock_);
                 if (--device->handles_ == 0) {
-                    device->claimed_ = false;
+                    device->isClaimed_ = false;
+                    EXPECT_TRUE(device->running_.empty()) << "the device was closed while transfers ran";
                 }
-                EXPECT_TRUE(device->handles_ > 0 || device->running_.empty())
-                    << "the device was closed while transfers ran";
             }};
 }
 
-bool ScriptedUsbDevice::Matches(const Exchange& row, const Transfer& transfer) const {
-    return row.kind == Exchange::Kind::Transfer && row.endpoint == transfer.endpoint &&
-           !halted_.contains(transfer.endpoint) && row.length == transfer.length &&
-           (row.endpoint != 0 || row.setup == transfer.setup) &&
-           (row.IsIn() || std::equal(row.sent.begin(), row.sent.end(), transfer.data));
-}
-
-void ScriptedUsbDevice::Mismatch(const std::string& actual) {
-    // One difference makes all that follow differ.
-    if (!failed_) {
-        failed_ = true;
-        ADD_FAILURE() << "row " << played_ << " of the script differs\n  expected: "
-                      << (script_.empty() ? "nothing more" : script_.front().Describe())
-                      << "\n  actual:   " << actual << (halted_.empty() ? "" : " (an endpoint is halted)");
-    }
-}
-
-void ScriptedUsbDevice::CompleteReady(std::uint8_t endpoint) {
-    for (;;) {
-        Running ended{};
-        {
-            const std::lock_guard guard(lock_);
-            const auto oldest = std::ranges::find_if(running_, [endpoint](const Running& candidate) {
-                return candidate.transfer->endpoint == endpoint && !candidate.cancelled;
-            });
-            if (oldest == running_.end() || !oldest->ready) {
-                return;
-            }
-            ended = std::move(*oldest);
-            running_.erase(oldest);
-            if (ended.row.status == TransferStatus::Stalled && endpoint != 0 && !failed_) {
-                halted_.insert(endpoint);
-            }
+Exchange ScriptedUsbDevice::TakeRow(const std::string& actual) {
+    Exchange row;
+    if (script_.empty() || script_.front().expected != actual) {
+        if (!std::exchange(failed_, true)) {  // one difference makes all that follow differ
+            ADD_FAILURE() << "row " << played_ << " of the script differs\n  expected: "
+                          << (script_.empty() ? "nothing more" : script_.front().expected)
+                          << "\n  actual:   " << actual;
         }
-        Finish(ended);
+        row.status = TransferStatus::Stalled;
+        return row;
     }
+    row = std::move(script_.front());
+    script_.pop_front();
+    ++played_;
+    return row;
+}
+
+void ScriptedUsbDevice::Complete(std::uint64_t number) {
+    Running ended{};
+    {
+        const std::lock_guard guard(lock_);
+        const auto found = std::ranges::find(running_, number, &Running::number);
+        if (found == running_.end()) {
+            return;
+        }
+        ended = std::move(*found);
+        running_.erase(found);
+    }
+    Finish(ended);
 }
 
 void ScriptedUsbDevice::CompleteLater(std::uint64_t number, std::uint64_t delay) {
     auto& scheduler = Platform::ClockScheduler();
-    const auto event = scheduler.CallAt(scheduler.Now() + delay, [this, number] {
-        Running ended{};
-        std::uint8_t endpoint = 0;
-        {
-            const std::lock_guard guard(lock_);
-            const auto found = std::ranges::find(running_, number, &Running::number);
-            if (found == running_.end()) {
-                return;
-            }
-            endpoint = found->transfer->endpoint;
-            found->ready = true;
-            if (found->cancelled) {
-                ended = std::move(*found);
-                running_.erase(found);
-            }
-        }
-        if (ended.transfer != nullptr) {
-            Finish(ended);
-        }
-        CompleteReady(endpoint);
-    });
+    const auto event = scheduler.CallAt(scheduler.Now() + delay, [this, number] { Complete(number); });
     const std::lock_guard guard(lock_);
     events_.push_back(event);
 }
@@ -271,44 +262,21 @@ void ScriptedUsbDevice::Finish(const Running& completed) {
     Transfer& transfer = *completed.transfer;
     const Exchange& row = completed.row;
     if (transfer.IsIn()) {
-        const std::size_t copied = std::min<std::size_t>({row.moved, row.received.size(), transfer.length});
-        std::copy_n(row.received.begin(), copied, transfer.data);
+        std::copy_n(row.received.begin(), std::min<std::size_t>(row.moved, row.received.size()),
+                    transfer.data);
     }
     transfer.status = row.status;
     transfer.actualLength = std::min(row.moved, transfer.length);
     transfer.client->TransferCompleted(transfer);
 }
 
-void ScriptedBus::Plug(const std::string& name, std::shared_ptr<ScriptedUsbDevice> device) {
-    const std::lock_guard guard(lock_);
-    devices_.emplace_back(name, std::move(device));
-}
-
-ScriptedBus::Devices::iterator ScriptedBus::FindDevice(const std::string& name) {
-    return std::ranges::find(devices_, name, [](const auto& device) { return device.first; });
-}
-
 void ScriptedBus::Unplug(const std::string& name) {
-    std::shared_ptr<ScriptedUsbDevice> unplugged;
-    {
-        const std::lock_guard guard(lock_);
-        const auto found = FindDevice(name);
-        if (found == devices_.end()) {
-            return;
-        }
-        unplugged = std::move(found->second);
-        devices_.erase(found);
-    }
-    unplugged->Unplug();
-}
-
-void ScriptedBus::AnswerOpen(ErrorCode code) {
-    const std::lock_guard guard(lock_);
-    openAnswer_ = code;
+    const auto found = std::ranges::find(devices_, name, [](const auto& device) { return device.first; });
+    found->second->Unplug();
+    devices_.erase(found);
 }
 
 std::vector<std::string> ScriptedBus::List() {
-    const std::lock_guard guard(lock_);
     std::vector<std::string> names;
     for (const auto& device : devices_) {
         names.push_back(device.first);
@@ -317,17 +285,11 @@ std::vector<std::string> ScriptedBus::List() {
 }
 
 std::shared_ptr<Platform::Usb::UsbDevice> ScriptedBus::Open(const std::string& name, ErrorCode& error) {
-    const std::lock_guard guard(lock_);
-    error = openAnswer_;
-    if (error != Errors::Success) {
-        return nullptr;
-    }
-    const auto found = FindDevice(name);
-    if (found == devices_.end()) {
-        error = Errors::FileNotFound;
-        return nullptr;
-    }
-    return ScriptedUsbDevice::OpenHandle(found->second);
+    const auto found = std::ranges::find(devices_, name, [](const auto& device) { return device.first; });
+    error = openAnswer_ != Errors::Success ? openAnswer_
+            : found == devices_.end()      ? Errors::FileNotFound
+                                           : Errors::Success;
+    return error == Errors::Success ? ScriptedUsbDevice::OpenHandle(found->second) : nullptr;
 }
 
 }  // namespace Varnholt::Tests

@@ -188,9 +188,7 @@ TEST_F(UsbIoDriver, TransfersNeedABoundPipe) {
 }
 
 TEST_F(UsbIoDriver, PassesOnReservedBitsOfTheRequestType) {
-    Exchange reserved = VendorOut(0xC7, {5});
-    reserved.setup.requestType |= 0x1C;
-    device_->Expect({reserved});
+    device_->Expect({ControlOut({Protocol::VendorOut | 0x1C, 0xC7, 0, 0, 1}, {5})});
     Bytes data{5};
     EXPECT_EQ(
         Control(OpenBound(In), Code::ClassOrVendorOutRequest, RequestBlock(0xC7, 0, 0, 2, 0, 0x1C), data),
