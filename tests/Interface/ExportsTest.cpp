@@ -3,11 +3,13 @@
 
 #include <array>
 #include <functional>
+#include <stdexcept>
 #include <vector>
 
 #include "Interface/Readout.h"
 #include "ostra.h"
 #include "Protocol/Instrument.h"
+#include "Support/ScriptedDriver.h"
 #include "Support/SimulatedHost.h"
 #include "Support/TestClock.h"
 #include "TransferRecorder.h"
@@ -157,6 +159,32 @@ TEST_P(Exports, NullPointersAreRefusedAndTextsFollowTheirRules) {
         EXPECT_EQ(LastError(), "unknown error") << "asking for it does not clear it";
         ask();
         EXPECT_EQ(LastError(), "");
+    }
+}
+
+/// A failure stores no values, and whatever is thrown ends as a result code.
+TEST_P(Exports, WhatIsThrownBelowThemBecomesACodeAndAText) {
+    const bool isNative = GetParam() == Transport::Native;
+    ScriptedDriver driver;
+    const Platform::ScopedDeviceFiles files(driver);
+    const auto image = CountingImage();
+    values_.fill(7);
+    const struct {
+        std::function<void()> fail;
+        std::int32_t code;  ///< of a readout
+        const char* text;
+    } cases[] = {{[] { throw std::runtime_error("why"); }, OSTRA_FAILURE, "why"},
+                 {[] { throw std::out_of_range("why"); }, OSTRA_UNKNOWN_FAILURE, "unknown error"},
+                 {[] { throw 7; }, OSTRA_FAILURE, "unkown exception caught"}};
+    for (const auto& row : cases) {
+        driver.Script(isNative ? 1U : Protocol::BulkInEndpoint, {.onStart = row.fail});
+        EXPECT_EQ(d4fb86cecc88582a(values_.data(), ""), row.code);
+        EXPECT_EQ(LastError(), row.text);
+        driver.Script(isNative ? 2U : Protocol::BulkOutEndpoint, {.onStart = row.fail});
+        EXPECT_EQ(f3355d91d5df0e0b(image.data(), ""), OSTRA_UNKNOWN_FAILURE);
+        EXPECT_EQ(LastError(), row.text);
+        EXPECT_THAT(values_, Each(7));
+        EXPECT_EQ(driver.OpenFiles(), 0U);
     }
 }
 
