@@ -1,10 +1,12 @@
 #include <array>
+#include <cstdio>
 #include <string>
 
 #include "Platform/CallFilter.h"
 #include "Support/DriverTest.h"
 #include "UsbIo/CUsbIo.h"
 #include "UsbIo/ScopedDeviceList.h"
+#include "UsbIo/StatusTexts.h"
 
 namespace Varnholt::UsbIo {
 namespace {
@@ -13,25 +15,36 @@ using namespace Protocol::UsbIoDriver;
 using testing::ElementsAre;
 using testing::IsEmpty;
 
-TEST(CUsbIoErrorText, TextsAreThoseOfTheTable) {
-    const std::vector<std::pair<std::uint32_t, const char*>> cases{
-        {0, "Error code 0x00000000: No error."},
-        {0xE0000001, "Error code 0xE0000001: HC Error: Wrong CRC."},
-        {0xE000000E, "Error code 0xE000000E: Windows system error code."},
-        {0xE0001000, "Error code 0xE0001000: Operation failed."},
-        {0xE8001000, "Error code 0xE8001000: USBD Error: Insufficient resources."},
-        {0xE0001005, "Error code 0xE0001005: USB device is already configured."},
-        {0xE000100C, "Error code 0xE000100C: The request has been timed out."},
-        {0xE0001019, "Error code 0xE0001019: Windows system error code."},
-        {Status::UserEvent, "Error code 0xE000101E: Windows system error code."},
-        {Status::NoEnumeration, "Error code 0xE0001106: Windows system error code."},
-        {0xE0001107, "Error code 0xE0001107: The handle is already opened."},
-        {5, "Error code 0x00000005: Windows system error code."},
-    };
-    for (const auto& [status, expected] : cases) {
-        std::array<char, 200> text;
-        EXPECT_STREQ(CUsbIo::ErrorText(text.data(), text.size(), status), expected);
+TEST(CUsbIoErrorText, EveryStatusHasTheTextOfTheDocumentedTable) {
+    const std::string unknown = StatusText(5);
+    EXPECT_EQ(unknown, "Windows system error code.");
+    std::vector<std::uint32_t> statuses{0};
+    for (std::uint32_t status = 0xE0000000; status <= 0xE0060000; ++status) {
+        statuses.push_back(status);
     }
+    statuses.insert(statuses.end(), {0xE8000FFF, 0xE8001000, 0xE8001001});
+    // FNV-1a over the table as USBIO's documentation has it: "0xE0000001 HC Error: Wrong CRC." and a line's
+    // end, ordered by code.
+    std::uint64_t digest = 0xCBF29CE484222325;
+    int rows = 0;
+    for (const std::uint32_t status : statuses) {
+        if (StatusText(status) == unknown) {
+            continue;
+        }
+        ++rows;
+        char code[16];
+        std::snprintf(code, sizeof code, "0x%08X ", status);
+        for (const char byte : code + std::string(StatusText(status)) + "\n") {
+            digest = (digest ^ static_cast<std::uint8_t>(byte)) * 0x100000001B3;
+        }
+    }
+    EXPECT_EQ(rows, 85);
+    EXPECT_EQ(digest, 0xDFC676ED55E11C7C) << "a code or a text has changed";
+    std::array<char, 200> text;
+    EXPECT_STREQ(CUsbIo::ErrorText(text.data(), text.size(), 0xE000100C),
+                 "Error code 0xE000100C: The request has been timed out.");
+    EXPECT_STREQ(CUsbIo::ErrorText(text.data(), text.size(), 5),
+                 "Error code 0x00000005: Windows system error code.");
 }
 
 TEST(CUsbIoErrorText, IsCutToTheBuffer) {
