@@ -7,10 +7,7 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <filesystem>
-#include <iterator>
 #include <memory>
-#include <random>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -115,44 +112,30 @@ TEST_F(UsbIpServerTest, MemoryTravelsBothWays) {
     EXPECT_FALSE(instrument->Claimed()) << "the question for the endpoints has ended its claim";
     ASSERT_EQ(Errors::Success, device->Claim());
     Do(*device, TestTransfer::Memory(Request::WriteEeprom, 300, 3));
-    Do(*device, TestTransfer::Out(BulkOutEndpoint, {1, 2, 3}));
-    Do(*device, TestTransfer::Out(BulkOutEndpoint, {0}));
-    Do(*device, TestTransfer::Out(BulkOutEndpoint, {0}));
+    for (const Bytes& sent : {Bytes{1, 2, 3}, Bytes{0}, Bytes{0}}) {
+        Do(*device, TestTransfer::Out(BulkOutEndpoint, sent));
+    }
     Do(*device, TestTransfer::Memory(Request::ReadEeprom, 299, 5));
     const Bytes memory = Do(*device, TestTransfer::In(BulkInEndpoint, 5));
     EXPECT_EQ((Bytes{1, 2, 3}), Bytes(memory.begin() + 1, memory.begin() + 4));
 }
 
-TEST_F(UsbIpServerTest, ScanWithTwoTransfersInFlightIsComplete) {
-    constexpr std::uint32_t piece = 65536;
-    constexpr std::uint64_t total = 3 * 1024 * 1024 + 1000;
+/// A megabyte does not go into a socket at once.
+TEST_F(UsbIpServerTest, LargeTransfersArriveWhole) {
+    constexpr std::uint32_t piece = 1U << 20U;
     InstrumentSettings settings;
-    settings.scanBytes = total;
+    settings.scanBytes = 3 * piece + 1000;
     const auto instrument = server_.Add(name_, settings);
     const auto device = OpenAndClaim(name_);
     Do(*device, TestTransfer::Vendor(Request::Measure, {}));
     Bytes all;
-    auto current = std::unique_ptr<TestTransfer>(new TestTransfer(TestTransfer::In(BulkInEndpoint, piece)));
-    device->Submit(*current);
-    for (;;) {
-        auto next = std::unique_ptr<TestTransfer>(new TestTransfer(TestTransfer::In(BulkInEndpoint, piece)));
-        device->Submit(*next);
-        ASSERT_TRUE(current->Wait());
-        const Bytes data = current->Data();
+    for (std::size_t before = 0; all.empty() || all.size() - before == piece;) {
+        before = all.size();
+        const Bytes data = Do(*device, TestTransfer::In(BulkInEndpoint, piece));
         all.insert(all.end(), data.begin(), data.end());
-        std::swap(current, next);
-        if (data.size() < piece) {
-            device->Cancel(*current);
-            ASSERT_TRUE(current->Wait());
-            EXPECT_EQ(TransferStatus::Cancelled, current->status);
-            break;
-        }
     }
-    server_.Do([&] {
-        EXPECT_EQ(
-            instrument->WithCommands([](Commands& state) { return state.Answers().Expected(0, total); }),
-            all);
-    });
+    const auto expected = [&](Commands& state) { return state.Answers().Expected(0, settings.scanBytes); };
+    server_.Do([&] { EXPECT_EQ(instrument->WithCommands(expected), all); });
 }
 
 TEST_F(UsbIpServerTest, OneProgramAtATime) {
@@ -200,84 +183,6 @@ TEST_F(UsbIpServerTest, FaultsCrossTheConnection) {
         ASSERT_TRUE(gone.Wait());
         EXPECT_EQ(TransferStatus::DeviceGone, gone.status);
     }
-}
-
-TEST_F(UsbIpServerTest, SlowPeerDoesNotHoldUpTheOthers) {
-    const std::string other = ServerThread::UniqueName("b");
-    InstrumentSettings endless;
-    endless.scanBytes = std::uint64_t{1} << 40;
-    server_.Add(name_, endless);
-    server_.Add(other);
-
-    // Asks for a gigabyte and reads none of it.
-    const int lazy = Platform::Usb::ConnectToSimulator(name_);
-    ASSERT_GE(lazy, 0);
-    const auto send = [lazy](const auto& bytes) {
-        return ::send(lazy, bytes.data(), bytes.size(), MSG_DONTWAIT | MSG_NOSIGNAL) ==
-               static_cast<ssize_t>(bytes.size());
-    };
-    UsbIp::OperationHeader import;
-    import.operation = UsbIp::Operation::ImportRequest;
-    send(UsbIp::Encode(import));
-    send(UsbIp::EncodeBusId(Platform::Usb::SimulatorBusId));
-    UsbIp::SubmitPacket measure;
-    measure.setup = {Protocol::VendorOut, static_cast<std::uint8_t>(Request::Measure), 0, 0, 0};
-    measure.sequence = 1;
-    send(UsbIp::Encode(measure));
-    UsbIp::SubmitPacket read;
-    read.endpoint = BulkInEndpoint;
-    read.in = true;
-    read.length = 1U << 20;
-    for (read.sequence = 2; read.sequence < 1000 && send(UsbIp::Encode(read)); ++read.sequence) {
-    }
-
-    const auto device = OpenAndClaim(other);
-    for (int i = 0; i < 20; ++i) {
-        Do(*device, TestTransfer::Vendor(Request::Reset, {31}));
-    }
-    close(lazy);
-}
-
-TEST_F(UsbIpServerTest, PeersWithOddMannersDoNoHarm) {
-    const auto instrument = server_.Add(name_);
-    const auto countFiles = [] {
-        return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
-    };
-    const auto before = countFiles();
-    std::mt19937 random(3);
-    for (int round = 0; round < 200; ++round) {
-        const int file = Platform::Usb::ConnectToSimulator(name_);
-        ASSERT_GE(file, 0);
-        Bytes bytes(random() % 400);
-        for (std::uint8_t& byte : bytes) {
-            byte = static_cast<std::uint8_t>(random() % 5);
-        }
-        if (round % 2 == 0) {
-            const UsbIp::OperationHeader header{
-                UsbIp::ProtocolVersion,
-                round % 4 == 0 ? UsbIp::Operation::ImportRequest : UsbIp::Operation::ListRequest,
-                UsbIp::OperationStatus::Ok};
-            const auto start = UsbIp::Encode(header);
-            const auto busId = UsbIp::EncodeBusId(Platform::Usb::SimulatorBusId);
-            bytes.insert(bytes.begin(), busId.begin(), busId.end());
-            bytes.insert(bytes.begin(), start.begin(), start.end());
-        }
-        send(file, bytes.data(), bytes.size(), MSG_NOSIGNAL);
-        close(file);
-    }
-    Platform::ErrorCode code = Errors::Busy;
-    const auto device = Open(name_);
-    for (int i = 0; i < 1000 && code == Errors::Busy; ++i) {
-        usleep(1000);
-        code = device->Claim();
-    }
-    EXPECT_EQ(Errors::Success, code);
-    Do(*device, TestTransfer::Vendor(Request::Reset, {31}));
-    device->Release();
-    for (int i = 0; i < 1000 && countFiles() > before; ++i) {
-        usleep(1000);
-    }
-    EXPECT_EQ(before, countFiles());
 }
 
 TEST_F(UsbIpServerTest, PeerThatStopsWhereItIsDueIsGivenUp) {

@@ -54,25 +54,6 @@ TEST(VirtualTime, EventIsNotTheThreadThatHostsIt) {
     EXPECT_TRUE(ReleaseMutex(mutex.Get()));
 }
 
-/// Other threads run on while an event waits, and the time passes.
-TEST(VirtualTime, EventMayWaitForAThread) {
-    VirtualClock clock(1);
-    const OwnedHandle mutex(MakeMutex(""));
-    const OwnedHandle over(MakeAutoResetEvent());
-    TestThread owner([&] {
-        EXPECT_EQ(Wait(mutex.Get(), Infinite), WaitResult::Signalled);
-        SleepMilliseconds(10);
-        ReleaseMutex(mutex.Get());
-    });
-    ClockScheduler().CallAt(ClockScheduler().Now() + 1000, [&] {
-        EXPECT_EQ(Wait(mutex.Get(), Infinite), WaitResult::Signalled);
-        ReleaseMutex(mutex.Get());
-        SignalEvent(over.Get());
-    });
-    EXPECT_EQ(Wait(over.Get(), 5000), WaitResult::Signalled);
-    EXPECT_EQ(clock.ElapsedMilliseconds(), 10u);
-}
-
 /// Three threads note their steps; which steps follow on which is the seed's choice and nobody else's.
 std::string OrderOfSteps(std::uint64_t seed) {
     VirtualClock clock(seed);
@@ -172,20 +153,6 @@ TEST(VirtualTime, EndWaitsForThreadsAndDropsEvents) {
     EXPECT_TRUE(ended);
     EXPECT_FALSE(called);
     EXPECT_EQ(counted.use_count(), 1);
-}
-
-/// Polling with `SleepMilliseconds(0)` must let the time come to what is polled for.
-TEST(VirtualTime, PollingComesToAnEnd) {
-    VirtualClock clock(1);
-    const OwnedHandle event(MakeAutoResetEvent());
-    TestThread other([&] {
-        SleepMilliseconds(2);
-        SignalEvent(event.Get());
-    });
-    while (Wait(event.Get(), 0) != WaitResult::Signalled) {
-        SleepMilliseconds(0);
-    }
-    EXPECT_EQ(clock.ElapsedMilliseconds(), 2u);
 }
 
 }  // namespace
