@@ -67,31 +67,17 @@ std::uint32_t Make(World&) {
     return StatusOf(buffer.Buffer != nullptr);
 }
 
-std::uint32_t MakeList(World&) {
-    const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
-    return StatusOf(list != nullptr && CUsbIo::DestroyDeviceList(list));
-}
-
-std::uint32_t OpenOne(World&, Platform::DeviceList list) {
-    CUsbIo device;
-    const std::uint32_t status = device.Open(0, list, &InterfaceClass);
-    EXPECT_EQ(device.IsOpen(), status == Status::Success);
-    return status;
-}
-
-std::uint32_t Open(World& world) {
+std::uint32_t Open(World&) {
     Platform::DeviceList list = nullptr;
     {
         const Exempt guard;
         list = CUsbIo::CreateDeviceList(&InterfaceClass);
     }
-    const std::uint32_t status = OpenOne(world, list);
+    CUsbIo device;
+    const std::uint32_t status = device.Open(0, list, &InterfaceClass);
+    EXPECT_EQ(device.IsOpen(), status == Status::Success);
     CUsbIo::DestroyDeviceList(list);
     return status;
-}
-
-std::uint32_t OpenByNumber(World& world) {
-    return OpenOne(world, nullptr);
 }
 
 std::uint32_t BindPipe(World& world) {
@@ -117,37 +103,10 @@ std::uint32_t Configure(World& world) {
 }
 
 std::uint32_t Ask(World& world) {
-    DriverInfo info;
-    DeviceParameters parameters;
-    for (const std::uint32_t status :
-         {world.device.GetDriverInfo(info), world.device.GetDeviceParameters(parameters),
-          world.device.SetDeviceParameters(parameters),
-          StatusOf(world.device.GetDevicePathName() != nullptr)}) {
-        if (status != Status::Success) {
-            return status;
-        }
-    }
-    return Status::Success;
-}
-
-std::uint32_t RequestIn(World& world) {
     world.size = 8;
     world.request.type = RequestBlock::TypeVendor;
     world.request.request = static_cast<std::uint8_t>(Request::GetMisc);
     return world.device.ClassOrVendorInRequest(world.data.data(), world.size, world.request);
-}
-
-std::uint32_t RequestOut(World& world) {
-    world.size = 1;
-    world.data[0] = 31;
-    world.request.type = RequestBlock::TypeVendor;
-    world.request.request = static_cast<std::uint8_t>(Request::Reset);
-    return world.device.ClassOrVendorOutRequest(world.data.data(), world.size, world.request);
-}
-
-std::uint32_t ReadInVain(World& world) {
-    world.size = World::Room;
-    return world.pipe.ReadSync(world.data.data(), world.size, 10);
 }
 
 std::uint32_t ReadUntilEvent(World& world) {
@@ -160,13 +119,8 @@ std::uint32_t ReadUntilEvent(World& world) {
     return world.pipe.ReadSyncUntil(world.data.data(), world.size, Platform::Infinite, event.Get());
 }
 
-std::uint32_t WriteAtOnce(World& world) {
-    world.size = 1;
-    return world.pipe.WriteSync(world.data.data(), world.size, 10);
-}
-
-/// A read that is started, waited for in vain and ended by `end`.
-std::uint32_t ReadAndEnd(World& world, const std::function<std::uint32_t(World&)>& end) {
+/// A read that is started, waited for in vain and aborted.
+std::uint32_t Abort(World& world) {
     CUsbIoBuffer buffer(world.data.data(), World::Room);
     buffer.NumberOfBytesToTransfer = buffer.Size;
     if (!world.pipe.Read(buffer)) {
@@ -177,18 +131,8 @@ std::uint32_t ReadAndEnd(World& world, const std::function<std::uint32_t(World&)
         status != Status::TimedOut) {
         return status;
     }
-    if (const std::uint32_t status = end(world); status != Status::Success) {
-        return status;
-    }
-    return world.pipe.WaitForCompletion(buffer, Platform::Infinite);
-}
-
-std::uint32_t Abort(World& world) {
-    return ReadAndEnd(world, [](World& self) { return self.pipe.AbortPipe(); });
-}
-
-std::uint32_t CancelOwn(World& world) {
-    return ReadAndEnd(world, [](World& self) { return StatusOf(self.pipe.CancelIo()); });
+    const std::uint32_t status = world.pipe.AbortPipe();
+    return status != Status::Success ? status : world.pipe.WaitForCompletion(buffer, Platform::Infinite);
 }
 
 std::uint32_t UsePool(World&) {
@@ -221,11 +165,6 @@ std::uint32_t RunStream(World& world) {
     return StatusOf(stream.ShutdownThread());
 }
 
-std::uint32_t TellError(World& world) {
-    auto* const text = reinterpret_cast<char*>(world.data.data());
-    return StatusOf(CUsbIo::ErrorText(text, world.data.size(), Status::NoMemory) == text && *text == 'E');
-}
-
 struct Case {
     const char* name;
     std::uint32_t (*call)(World&);
@@ -233,23 +172,15 @@ struct Case {
 };
 constexpr std::array Cases{
     Case{"Make", &Make, Status::Success},
-    Case{"MakeList", &MakeList, Status::Success},
     Case{"Open", &Open, Status::Success},
-    Case{"OpenByNumber", &OpenByNumber, Status::DeviceNotFound},
     Case{"BindPipe", &BindPipe, Status::Success},
     Case{"Configure", &Configure, Status::Success},
     Case{"Ask", &Ask, Status::Success},
-    Case{"RequestIn", &RequestIn, Status::Success},
-    Case{"RequestOut", &RequestOut, Status::Success},
-    Case{"ReadInVain", &ReadInVain, Status::TimedOut},
     Case{"ReadUntilEvent", &ReadUntilEvent, Status::UserEvent},
-    Case{"WriteAtOnce", &WriteAtOnce, Status::InvalidDirection},
     Case{"Abort", &Abort, Status::Cancelled},
-    Case{"CancelOwn", &CancelOwn, Status::Cancelled},
     Case{"UsePool", &UsePool, Status::Success},
     Case{"Reader", &RunStream<CUsbIoReader>, Status::Success},
     Case{"Writer", &RunStream<CUsbIoWriter>, Status::Success},
-    Case{"TellError", &TellError, Status::Success},
 };
 
 bool TellsOfMemory(std::uint32_t status) {
