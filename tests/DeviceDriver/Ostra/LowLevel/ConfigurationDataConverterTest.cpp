@@ -17,7 +17,7 @@ using Tests::ExpectThrow;
 using Varnholt::Utilities::Exceptions::RuntimeException;
 using Ids = std::set<int>;
 
-/// Calibration, log, misc and measure parameters show in what the memory model loads.
+/// Calibration and log parameters show in what the memory model loads.
 TEST(ConfigurationDataConverter, OtherCategories) {
     using Converter = ConfigurationDataConverter;
     const struct {
@@ -26,6 +26,8 @@ TEST(ConfigurationDataConverter, OtherCategories) {
         Ids ids;
     } categories[] = {
         {"special", &Converter::IsSpecialParameter, {3009, 3010}},
+        {"misc", &Converter::IsMiscParameter, {2004, 2006, 2012, 2013, 2016, 2017, 2020}},
+        {"measure", &Converter::IsMeasureParameter, {2000, 2001, 2002, 2003, 2008, 2009, 2010, 2021}},
         {"reset", &Converter::IsResetParameter, {2007}},
         {"CPLD", &Converter::IsCPLDParameter, {20000}},
         {"firmware download", &Converter::IsFirmwareDownloadParameter, {20003}},

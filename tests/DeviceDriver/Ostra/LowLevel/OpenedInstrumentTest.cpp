@@ -1,5 +1,5 @@
-// The command set over a simulated instrument, by either transport: messages, and where failures say they
-// passed.
+// The command set over a simulated instrument, by either transport: where failures say they passed, and
+// closing.
 #include <optional>
 
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
@@ -10,63 +10,60 @@
 namespace Varnholt::Tests {
 namespace {
 
-using DeviceDriver::Generic::MessageButtonData;
-using DeviceDriver::Generic::MessageDeviceGone;
 using DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
-using Platform::SleepMilliseconds;
-using testing::ElementsAre;
-using Codes = std::vector<std::uint32_t>;
 
 class OpenedInstrument : public testing::TestWithParam<Transport> {
   protected:
     TestClock clock_{TestTime::Virtual};
     SimulatedHost host_{GetParam()};
     Simulator::SimulatedInstrument& instrument_ = host_.Add("a");
-    const std::string transport_ =
-        GetParam() == Transport::Native ? "PellandoFunctionality_PC" : "PellandoFunctionality_Win64";
 };
 INSTANTIATE_TEST_SUITE_P(Transports, OpenedInstrument, testing::Values(Transport::Native, Transport::UsbIo),
                          [](const auto& parameter) { return std::string(Name(parameter.param)); });
 
-TEST_P(OpenedInstrument, SendsItsMessagesUntilTheListenerIsRemoved) {
-    const struct {
-        const char* name;
-        bool isRemoved, isPressed, isUnplugged;
-        Codes messages;
-    } cases[] = {
-        {"pressed and unplugged", false, true, true, {MessageButtonData, MessageDeviceGone}},
-        {"unplugged", false, false, true, {MessageDeviceGone}},
-        {"removed before that", true, true, true, {}},
-        {"pressed and closed", false, true, false, {MessageButtonData}},
-        {"closed untouched", false, false, false, {}},
-    };
-    for (const auto& row : cases) {
-        SCOPED_TRACE(row.name);
-        RecordingListener listener;
-        {
-            PellandoFunctionality opened(&listener, 0);
-            SleepMilliseconds(50);  // an interrupt just after the opening is thrown away
-            if (row.isRemoved) {
-                opened.removeListener(&listener);
-            }
-            if (row.isPressed) {
-                instrument_.PressButton();
-                SleepMilliseconds(50);
-            }
-            if (row.isUnplugged) {
-                instrument_.Unplug();
-                SleepMilliseconds(50);
-            }
+/// The operations of a trace behind the place of the failure, without namespaces: the last `count` of them.
+template <class Operation>
+std::string TraceOf(std::size_t count, Operation operation) {
+    std::string operations;
+    try {
+        operation();
+        ADD_FAILURE() << "nothing thrown";
+    } catch (const IOException& exception) {
+        const std::string front = "::Varnholt::DeviceDriver::Ostra::LowLevel::";
+        const Lines trace(exception.GetTrace().begin(), exception.GetTrace().end());
+        EXPECT_GT(trace.size(), count);
+        for (std::size_t i = trace.size() - std::min(count, trace.size()); i < trace.size(); ++i) {
+            EXPECT_THAT(trace[i], testing::StartsWith(front));
+            operations += (operations.empty() ? "" : " ") +
+                          trace[i].substr(front.size(), trace[i].find("()") - front.size());
         }
-        EXPECT_EQ(listener.Codes(), row.messages);
-        instrument_.PlugIn();
     }
+    return operations;
+}
+
+TEST_P(OpenedInstrument, FailuresNameTheOperationsThatTheyLeft) {
+    const bool isNative = GetParam() == Transport::Native;
+    const std::string transport = isNative ? "PellandoFunctionality_PC" : "PellandoFunctionality_Win64";
+    const std::string constructor = "PellandoFunctionality::PellandoFunctionality";
+    const auto open = [] { PellandoFunctionality(nullptr, 0); };
+    host_.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 0:stall"));
+    EXPECT_EQ(TraceOf(3, open), transport + "::Reset PellandoFunctionality::Reset " + constructor);
+    host_.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 1:stall; bulk-in 0:stall"));
+    {
+        PellandoFunctionality opened(nullptr, 0);
+        std::uint8_t byte = 0;
+        EXPECT_EQ(TraceOf(2, [&] { opened.SetMeasureMode(1); }),
+                  transport + "::SetMeasureMode PellandoFunctionality::SetMeasureMode");
+        EXPECT_EQ(TraceOf(2, [&] { opened.MeasureRequest(&byte, 1, 1); }),
+                  transport + "::MeasureRequest PellandoFunctionality::MeasureRequest");
+    }
+    instrument_.Unplug();
+    EXPECT_EQ(TraceOf(4, open), transport + (isNative ? "::GetDeviceAddress " : "::InitUSBIO ") + transport +
+                                    "::" + transport + " PellandoFunctionalityByte::Instance " + constructor);
 }
 
 TEST_P(OpenedInstrument, ClosesWithoutWaitingForTheDeviceLock) {
-    RecordingListener listener;
-    std::optional<PellandoFunctionality> opened(std::in_place, &listener, 0);
-    SleepMilliseconds(50);
+    std::optional<PellandoFunctionality> opened(std::in_place, nullptr, 0);
     Varnholt::Utilities::Multithreading::Mutex mutex(std::string(Name(GetParam())) + "a");
     mutex.Lock();
     const Stopwatch watch(clock_);
@@ -75,57 +72,6 @@ TEST_P(OpenedInstrument, ClosesWithoutWaitingForTheDeviceLock) {
     watch.ExpectAtMost(5);
     mutex.Unlock();
     EXPECT_FALSE(instrument_.Claimed());
-    EXPECT_EQ(listener.Codes(), Codes());
-}
-
-/// The operations of a trace, without namespaces and places.
-template <class Operation>
-Lines TraceOf(Operation operation) {
-    Lines operations;
-    try {
-        operation();
-        ADD_FAILURE() << "nothing thrown";
-    } catch (const IOException& exception) {
-        const std::string front = "::Varnholt::DeviceDriver::Ostra::LowLevel::";
-        for (const std::string& entry : exception.GetTrace()) {
-            EXPECT_THAT(entry, testing::StartsWith(front));
-            operations.push_back(entry.substr(front.size(), entry.find("()") - front.size()));
-        }
-    }
-    return operations;
-}
-
-TEST_P(OpenedInstrument, FailuresNameTheOperationsThatTheyLeft) {
-    host_.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 1:stall; bulk-in 0:stall"));
-    PellandoFunctionality opened(nullptr, 0);
-    std::uint8_t byte = 0;
-    const std::pair<const char*, std::function<void()>> cases[] = {
-        {"::SetMeasureMode", [&] { opened.SetMeasureMode(1); }},
-        {"::MeasureRequest", [&] { opened.MeasureRequest(&byte, 1, 1); }}};
-    for (const auto& [operation, run] : cases) {
-        Lines trace = TraceOf(run);
-        ASSERT_GT(trace.size(), 2U);
-        trace.erase(trace.begin(), trace.end() - 2);
-        EXPECT_THAT(trace,
-                    ElementsAre(transport_ + operation, std::string("PellandoFunctionality") + operation));
-    }
-}
-
-TEST_P(OpenedInstrument, AnOpeningThatFailsNamesEachOperationOnce) {
-    host_.Bus().SetFaults("a", Simulator::FaultPlan::Parse("control 0:stall"));
-    const auto open = [] { PellandoFunctionality(nullptr, 0); };
-    Lines trace = TraceOf(open);
-    ASSERT_GT(trace.size(), 3U);
-    trace.erase(trace.begin(), trace.end() - 3);
-    const std::string constructor = "PellandoFunctionality::PellandoFunctionality";
-    EXPECT_THAT(trace, ElementsAre(transport_ + "::Reset", "PellandoFunctionality::Reset", constructor));
-
-    instrument_.Unplug();
-    const std::string search =
-        transport_ + (GetParam() == Transport::Native ? "::GetDeviceAddress" : "::InitUSBIO");
-    EXPECT_THAT(TraceOf(open), ElementsAre(search, search, transport_ + "::" + transport_,
-                                           "PellandoFunctionalityByte::Instance", constructor))
-        << "the place of the failure, then the operations";
 }
 
 }  // namespace
