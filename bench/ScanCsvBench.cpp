@@ -6,11 +6,11 @@
 #include <fstream>
 #include <vector>
 
-#include "Interruption.h"
 #include "Output/RecordingFile.h"
+#include "Output/RecordWriter.h"
 #include "Protocol/ByteOrder.h"
-#include "ScanRecorder.h"
 #include "SensorModel.h"
+#include "Service/Interruption.h"
 
 namespace Varnholt::Bench {
 namespace {
@@ -50,9 +50,10 @@ void WriteStreamed(std::ostream& out, std::span<const std::uint8_t> transfer) {
 void ScanCsv(benchmark::State& state) {
     const std::vector<std::uint8_t> transfer = Transfer();
     std::ofstream stream("/dev/null", std::ios::binary);
-    Cli::Interruption none;
+    Service::Interruption none;
     Cli::RecordingFile file("/dev/null", none);
-    Cli::ScanRecorder recorder({RecordSize, false, false, {}}, file, [](std::uint64_t) {});
+    Cli::RecordWriter writer({RecordSize, false, false, {}}, file);
+    Service::ScanRecorder recorder(RecordSize, writer, [](std::uint64_t) {});
     double streamed = 0;
     double recorded = 0;
     for (auto _ : state) {

@@ -7,7 +7,7 @@
 #include <limits>
 #include <utility>
 
-#include "Number.h"
+#include "Service/Number.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -19,7 +19,7 @@ CLI::Option* OfIntegers(CLI::Option* option) {
     return option->transform(CLI::Validator(
         [](std::string& text) -> std::string {
             std::uint64_t number = 0;
-            if (!ParseNumber(text, std::numeric_limits<Integer>::max(), number)) {
+            if (!Service::ParseNumber(text, std::numeric_limits<Integer>::max(), number)) {
                 return fmt::format("'{}' is no whole number up to {}", text,
                                    std::numeric_limits<Integer>::max());
             }

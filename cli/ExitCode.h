@@ -1,6 +1,11 @@
 #pragma once
 
+#include "Service/Failure.h"
+
 namespace Varnholt::Cli {
+
+using Service::Failure;
+using Service::FailureKind;
 
 /// What the tool tells the shell: one number for each class of failure. Scripts rely on them; they are
 /// described in docs/ostra-tool.md and in the tool's help.
@@ -17,5 +22,7 @@ enum class ExitCode : int {
     Different = 9,      ///< the images that were compared differ
     Interrupted = 130,  ///< ended by Ctrl-C or a signal
 };
+
+ExitCode ExitCodeOf(FailureKind kind);
 
 }  // namespace Varnholt::Cli

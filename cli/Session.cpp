@@ -3,10 +3,9 @@
 #include <algorithm>
 #include <ostream>
 
-#include "Instrument.h"
 #include "Output/Json.h"
+#include "Output/ProgressLine.h"
 #include "SystemCommands.h"
-#include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -19,12 +18,10 @@ constexpr int WidestPlot = 120;
 
 }  // namespace
 
-Session::Session(Surroundings& surroundings, Interruption& userInterruption)
-    : where_(surroundings), interruption_(userInterruption) {}
+Session::Session(Streams& streams, Service::Interruption& userInterruption)
+    : streams_(streams), interruption_(userInterruption) {}
 
-Session::~Session() {
-    interruption_.SetAction({});
-}
+Session::~Session() = default;
 
 void Session::CarryOut() {
     if (!captureFile.empty()) {
@@ -32,13 +29,10 @@ void Session::CarryOut() {
     }
     if (verbose) {
         loggedFiles_.emplace(Platform::DeviceFiles(),
-                             [this](const std::string& line) { where_.log << Name + line + '\n'; });
-        files_.emplace(*loggedFiles_);
-    } else {
-        files_.emplace(Platform::DeviceFiles());
+                             [this](const std::string& line) { streams_.log << Name + line + '\n'; });
+        loggedFilesInForce_.emplace(*loggedFiles_);
     }
-    filesInForce_.emplace(*files_);
-    interruption_.SetAction([this] { files_->Interrupt(); });
+    context_.emplace(*this, interruption_);
     interruption_.ThrowIfRequested();  // one that came before
     action();
     FlushOut();
@@ -47,14 +41,14 @@ void Session::CarryOut() {
     }
 }
 
-void Session::BeginRecording() {
+void Session::Opening() {
     if (recording_) {
         recording_->Begin();
     }
 }
 
 std::string Session::Paint(const char* color, const std::string& text) const {
-    return where_.errFacts.showsColor ? "\x1b[" + std::string(color) + "m" + text + "\x1b[0m" : text;
+    return streams_.errFacts.showsColor ? "\x1b[" + std::string(color) + "m" + text + "\x1b[0m" : text;
 }
 
 void Session::Print(const nlohmann::ordered_json& value) {
@@ -62,94 +56,74 @@ void Session::Print(const nlohmann::ordered_json& value) {
 }
 
 void Session::FlushOut() {
-    where_.out.flush();
-    if (!where_.out) {
+    streams_.out.flush();
+    if (!streams_.out) {
         interruption_.ThrowIfRequested();
-        throw ToolFailure(ExitCode::File, "the output cannot be written");
+        throw Failure(FailureKind::File, "the output cannot be written");
     }
 }
 
 void Session::ClaimOut() {
-    if (where_.outFacts.isTerminal) {
-        throw ToolFailure(ExitCode::Usage, "raw bytes are no use on a terminal",
-                          "write them to a file, or into a pipe");
+    if (streams_.outFacts.isTerminal) {
+        throw Failure(FailureKind::BadArgument, "raw bytes are no use on a terminal",
+                      "write them to a file, or into a pipe");
     }
     SetStandardOutputBinary();
     outIsClaimed_ = true;
 }
 
 void Session::WriteClaimedOut(std::span<const std::uint8_t> content) {
-    where_.out.write(reinterpret_cast<const char*>(content.data()),
-                     static_cast<std::streamsize>(content.size()));
+    streams_.out.write(reinterpret_cast<const char*>(content.data()),
+                       static_cast<std::streamsize>(content.size()));
     FlushOut();
 }
 
 void Session::ClaimIn() {
     if (inIsClaimed_) {
-        throw ToolFailure(ExitCode::Usage, "standard input can be only one file",
-                          "give the other one a name");
+        throw Failure(FailureKind::BadArgument, "standard input can be only one file",
+                      "give the other one a name");
     }
     inIsClaimed_ = true;
 }
 
 void Session::Note(const std::string& text) {
-    where_.err << Name << text << '\n';
+    streams_.err << Name << text << '\n';
 }
 
 void Session::Warn(const std::string& text) {
-    where_.err << Paint(Yellow, Name) << text << '\n';
+    streams_.err << Paint(Yellow, Name) << text << '\n';
 }
 
-void Session::Report(const FailureReport& report) {
-    where_.err << Paint(Red, Name) << report.message << '\n';
-    if (!report.advice.empty()) {
-        where_.err << AdviceIndent << report.advice << '\n';
+void Session::Report(const Failure& failure) {
+    streams_.err << Paint(Red, Name) << failure.what() << '\n';
+    if (!failure.Advice().empty()) {
+        streams_.err << AdviceIndent << failure.Advice() << '\n';
     }
 }
 
-Progress Session::MakeProgress(const std::string& title, std::uint64_t total, const std::string& unit) {
-    StreamFacts facts = where_.errFacts;
+std::unique_ptr<Service::Progress> Session::StartProgress(const std::string& title, std::uint64_t total,
+                                                          const std::string& unit) {
+    StreamFacts facts = streams_.errFacts;
     facts.isTerminal = facts.isTerminal && !verbose;
-    return {where_.err, facts, title, total, unit};
+    return std::make_unique<ProgressLine>(streams_.err, facts, title, total, unit);
 }
 
 PlotStyle Session::StyleOfPlots() const {
     PlotStyle style;
-    style.braille = where_.outFacts.showsUtf8;
-    style.width = std::min(where_.outFacts.size().columns - 1, WidestPlot);
+    style.braille = streams_.outFacts.showsUtf8;
+    style.width = std::min(streams_.outFacts.size().columns - 1, WidestPlot);
     return style;
 }
 
 void Session::ChooseTransport(const std::string& name) {
-    using DeviceDriver::Ostra::Transport;
+    using Transport = Service::Context::Transport;
     if (!name.empty()) {
-        chosenTransport_ = name == "usbio" ? Transport::UsbIo : Transport::Native;
+        context_->ChooseTransport(name == "usbio" ? Transport::UsbIo : Transport::Native);
     }
 }
 
-FailureReport Session::Explain(const std::exception_ptr& failure) const {
-    FailureReport report = Describe(failure);
-    bool isOwn = false;
-    try {
-        std::rethrow_exception(failure);
-    } catch (const ToolFailure&) {
-        isOwn = true;
-    } catch (const Utilities::Files::FileError&) {
-        isOwn = true;
-    } catch (...) {  // the library's: its text says nothing of which instrument
-    }
-    if (!isOwn && interruption_.IsRequested()) {
-        return {ExitCode::Interrupted, "interrupted", {}};
-    }
-    if (isOwn || instrumentInUse_.empty()) {
-        return report;
-    }
-    if (report.code == ExitCode::InputOutput && !IsConnected(instrumentInUse_, UsedTransport())) {
-        report = {ExitCode::NoInstrument, "unplugged (" + report.message + ")",
-                  "plug it in again; `ostra list` shows whether it is found"};
-    }
-    report.message = instrumentInUse_ + ": " + report.message;
-    return report;
+Failure Session::Explain(const std::exception_ptr& exception) const {
+    return context_ ? context_->Explain(exception) : Service::Describe(exception);
 }
 
 }  // namespace Varnholt::Cli

@@ -4,8 +4,7 @@
 #include <string>
 
 #include "CommandSpec.h"
-#include "Failure.h"
-#include "Platform/ErrorCodes.h"
+#include "ExitCode.h"
 
 namespace Varnholt::Cli {
 
@@ -13,16 +12,6 @@ class Session;
 
 /// Adds the commands that only this platform has.
 void AddSystemCommands(CommandSpec app, Session& session);
-
-/// What the user can do next with this platform's means.
-namespace SystemAdvice {
-extern const char* const NoneIsFound;
-extern const char* const NoPermission;
-extern const char* const TransferFailed;
-}  // namespace SystemAdvice
-
-/// Why the system refuses the lock of an instrument, and what to do: `code` is what `MakeMutex` left.
-FailureReport DescribeMissingLock(Platform::ErrorCode code);
 
 /// Prints the devices that could be instruments, as a table or JSON (--candidates of the list command).
 void PrintCandidates(Session& session, bool json);
@@ -33,9 +22,9 @@ class TrafficRecording {
   public:
     virtual ~TrafficRecording() = default;
     /// Makes the file, or empties the one that is there; once, however often it is called. Before that
-    /// nothing is recorded. Throws `ToolFailure`.
+    /// nothing is recorded. Throws `Failure`.
     virtual void Begin() = 0;
-    /// Throws `ToolFailure` when something could not be written.
+    /// Throws `Failure` when something could not be written.
     virtual void Check() const = 0;
 };
 std::unique_ptr<TrafficRecording> RecordTraffic(const std::string& file);

@@ -86,8 +86,8 @@ void PrintHelp(CLI::App& app, const std::vector<std::string>& words, Session& se
         const auto fitting = found.command->get_subcommands(
             [&word](CLI::App* command) { return command->get_name() == word; });
         if (fitting.empty()) {
-            throw ToolFailure(ExitCode::Usage, "`" + found.name + "` has no command '" + word + "'",
-                              AdviceOn(found));
+            throw Failure(FailureKind::BadArgument, "`" + found.name + "` has no command '" + word + "'",
+                          AdviceOn(found));
         }
         found = {fitting.front(), found.name + " " + word};
     }
@@ -112,7 +112,7 @@ void PassOn(CLI::App& app, const char* name) {
     const NamedCommand chosen = ChosenCommand(app);
     CLI::Option* const own = chosen.command->get_option_no_throw(name);
     const auto refusal = [&](const std::string& why) {
-        return ToolFailure(ExitCode::Usage, name + why, AdviceOn(chosen));
+        return Failure(FailureKind::BadArgument, name + why, AdviceOn(chosen));
     };
     if (own == nullptr) {
         throw refusal(" means nothing to `" + chosen.name + "`");
@@ -152,7 +152,7 @@ void BuildCommandLine(CLI::App& app, InstrumentOptions& instrument, Session& ses
 }
 
 /// What is wrong with a command line, and whose help tells more.
-FailureReport ReportOf(CLI::App& app, const CLI::ParseError& error) {
+Failure ReportOf(CLI::App& app, const CLI::ParseError& error) {
     const NamedCommand chosen = ChosenCommand(app);
     std::string message = error.what();
     if (error.get_exit_code() == static_cast<int>(CLI::ExitCodes::ExtrasError)) {
@@ -170,15 +170,15 @@ FailureReport ReportOf(CLI::App& app, const CLI::ParseError& error) {
         message = word == unknown.end() ? "a command is missing behind `" + chosen.name + "`"
                                         : "`" + chosen.name + "` has no command '" + *word + "'";
     }
-    return {ExitCode::Usage, message, AdviceOn(chosen)};
+    return {FailureKind::BadArgument, message, AdviceOn(chosen)};
 }
 
-ExitCode Run(std::vector<std::string> arguments, Surroundings& surroundings, Session& session) {
+ExitCode Run(std::vector<std::string> arguments, Streams& streams, Session& session) {
     CLI::App app(Description, "ostra");
     InstrumentOptions instrument;
     BuildCommandLine(app, instrument, session);
     if (arguments.empty()) {
-        surroundings.err << app.help();
+        streams.err << app.help();
         return ExitCode::Usage;
     }
     try {
@@ -189,7 +189,7 @@ ExitCode Run(std::vector<std::string> arguments, Surroundings& surroundings, Ses
     } catch (const CLI::ParseError& error) {
         const bool isHelp = error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success);
         if (isHelp) {
-            app.exit(error, surroundings.out, surroundings.err);
+            app.exit(error, streams.out, streams.err);
             session.FlushOut();
             return ExitCode::Success;
         }
@@ -202,15 +202,15 @@ ExitCode Run(std::vector<std::string> arguments, Surroundings& surroundings, Ses
 
 }  // namespace
 
-ExitCode RunTool(const std::vector<std::string>& arguments, Surroundings& surroundings,
-                 Interruption& interruption) {
-    Session session(surroundings, interruption);
+ExitCode RunTool(const std::vector<std::string>& arguments, Streams& streams,
+                 Service::Interruption& interruption) {
+    Session session(streams, interruption);
     try {
-        return Run(arguments, surroundings, session);
+        return Run(arguments, streams, session);
     } catch (...) {
-        const FailureReport report = session.Explain(std::current_exception());
-        session.Report(report);
-        return report.code;
+        const Failure failure = session.Explain(std::current_exception());
+        session.Report(failure);
+        return ExitCodeOf(failure.Kind());
     }
 }
 

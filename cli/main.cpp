@@ -9,7 +9,7 @@ using namespace Varnholt::Cli;
 int main(int argc, char** argv) {
     SecureStandardStreams();
     try {
-        Interruption interruption;
+        Varnholt::Service::Interruption interruption;
         const SignalWatch watch([&interruption] { interruption.Request(); });
         // Both can be stopped, by a reader that does not read or a terminal that is held: then too the user's
         // wish to end is seen.
@@ -22,8 +22,8 @@ int main(int argc, char** argv) {
         DescriptorStream log(OutputDescriptor::StandardError(), interruption,
                              DescriptorStream::Lost::IsIgnored);
         log << std::unitbuf;
-        Surroundings surroundings{out, err, log, FactsOfStandardOutput(), FactsOfStandardError()};
-        return static_cast<int>(RunTool({argv + 1, argv + argc}, surroundings, interruption));
+        Streams streams{out, err, log, FactsOfStandardOutput(), FactsOfStandardError()};
+        return static_cast<int>(RunTool({argv + 1, argv + argc}, streams, interruption));
     } catch (const std::exception& exception) {
         std::cerr << "ostra: " << exception.what() << '\n';
     }

@@ -96,7 +96,7 @@ function(ostra_test NAME)
   add_test(NAME ${NAME} COMMAND ${COMMAND})
   set_tests_properties(${NAME} PROPERTIES TIMEOUT 500 SKIP_RETURN_CODE 77)
   # The native transport locks an instrument for the whole machine, by its path: tests of it wait for each other.
-  foreach(LIBRARY IN ITEMS ostra_native ostra_browser ostra_interface ostra_cli)
+  foreach(LIBRARY IN ITEMS ostra_native ostra_browser ostra_interface ostra_service ostra_cli)
     if(LIBRARY IN_LIST ARG_LINK)
       set_tests_properties(${NAME} PROPERTIES RESOURCE_LOCK instruments)
     endif()

@@ -1,13 +1,16 @@
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
-#include "Memory/ImageEdit.h"
+#include "Memory/InputFile.h"
 #include "Memory/MemoryTarget.h"
 #include "Memory/NewFile.h"
 #include "Output/Json.h"
 #include "Protocol/EepromMap.h"
+#include "Service/Memory/ImageEdit.h"
 
 namespace Varnholt::Cli {
 namespace {
+
+using namespace Service;
 
 struct GetOptions {
     MemoryOptions memory;

@@ -2,15 +2,17 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
-#include "Memory/ImageEdit.h"
-#include "Memory/ImageModel.h"
 #include "Memory/MemoryTarget.h"
 #include "Output/Json.h"
 #include "Output/Table.h"
 #include "Output/ValueList.h"
+#include "Service/Memory/ImageEdit.h"
+#include "Service/Memory/ImageModel.h"
 
 namespace Varnholt::Cli {
 namespace {
+
+using namespace Service;
 
 struct ShowOptions {
     MemoryOptions memory;

@@ -1,8 +1,24 @@
 #include "Commands/CommonOptions.h"
 
+#include <fmt/format.h>
+
 namespace Varnholt::Cli {
 namespace {
 constexpr const char* Heading = "Instrument";
+}
+
+Service::FoundInstrument ChooseInstrument(Session& session, const InstrumentOptions& options, Choice choice) {
+    session.ChooseTransport(options.transport);
+    Service::FoundInstrument found = FindInstrument(session.Context(), options.device);
+    if (options.device.empty() && found.connected.size() > 1) {
+        if (choice == Choice::MustBeNamed) {
+            throw Failure(FailureKind::BadArgument, "several instruments are connected",
+                          fmt::format("say which one with --device: {}", fmt::join(found.connected, ", ")));
+        }
+        session.Note(fmt::format("taking {}, the first of {} (--device names another)", found.Identifier(),
+                                 found.connected.size()));
+    }
+    return found;
 }
 
 void AddInstrumentOptions(CommandSpec command, InstrumentOptions& options) {

@@ -3,10 +3,25 @@
 #include <memory>
 
 #include "CommandSpec.h"
-#include "Instrument.h"
+#include "Service/Instruments.h"
 #include "Session.h"
 
 namespace Varnholt::Cli {
+
+/// Which instrument a command works on, and how it reaches it.
+struct InstrumentOptions {
+    std::string device;     ///< identifier or the end of one, or "chip:" and a chip id; empty: the first
+    std::string transport;  ///< "native", "usbio" or empty
+};
+
+/// What happens when several instruments are connected and none is named.
+enum class Choice {
+    FirstWillDo,  ///< the first is taken, with a note
+    MustBeNamed,  ///< refused: what follows changes the instrument
+};
+/// Over the transport that the options name, which is then the session's.
+Service::FoundInstrument ChooseInstrument(Session& session, const InstrumentOptions& options,
+                                          Choice choice = Choice::FirstWillDo);
 
 /// Makes `run` the session's action when `command` is what the user asked for. The options live as long as
 /// the command line.

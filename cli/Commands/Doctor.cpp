@@ -2,8 +2,8 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
-#include "Finding.h"
 #include "Output/Json.h"
+#include "Service/Finding.h"
 #include "Session.h"
 
 namespace Varnholt::Cli {
@@ -13,6 +13,8 @@ struct Options {
     std::string transport;
     bool json = false;
 };
+
+using Service::Finding;
 
 const char* NameOf(Finding::Level level) {
     switch (level) {
@@ -28,16 +30,16 @@ const char* NameOf(Finding::Level level) {
 
 void Doctor(Session& session, const Options& options) {
     session.ChooseTransport(options.transport);
-    const std::vector<Finding> findings = Diagnose(session);
+    const std::vector<Finding> findings = Diagnose(session.Context());
     Json list = Json::array();
-    ExitCode code = ExitCode::Success;
+    std::optional<FailureKind> failure;
     for (const Finding& finding : findings) {
         list.push_back({{"level", NameOf(finding.level)},
                         {"subject", finding.subject},
                         {"text", finding.text},
                         {"fix", finding.fix}});
-        if (code == ExitCode::Success) {
-            code = finding.code;
+        if (!failure) {
+            failure = finding.failure;
         }
         if (!options.json) {
             session.Out() << NameOf(finding.level) << ": " << finding.subject
@@ -50,8 +52,8 @@ void Doctor(Session& session, const Options& options) {
     if (options.json) {
         session.Print({{"findings", list}});
     }
-    if (code != ExitCode::Success) {
-        throw ToolFailure(code, "an instrument cannot be used; see above");
+    if (failure) {
+        throw Failure(*failure, "an instrument cannot be used; see above");
     }
 }
 

@@ -3,15 +3,17 @@
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
 #include "Commands/Eeprom.h"
-#include "Memory/ImageCheck.h"
-#include "Memory/ImageModel.h"
 #include "Memory/InputFile.h"
 #include "Memory/MemoryTarget.h"
 #include "Memory/NewFile.h"
 #include "Output/Json.h"
+#include "Service/Memory/ImageCheck.h"
+#include "Service/Memory/ImageModel.h"
 
 namespace Varnholt::Cli {
 namespace {
+
+using namespace Service;
 
 struct BackupOptions {
     MemoryOptions memory;
@@ -20,8 +22,9 @@ struct BackupOptions {
 
 void Backup(Session& session, const BackupOptions& options) {
     const NewFile file(session, options.file);
-    Instrument instrument(session, options.memory.instrument);
-    const EepromImage image = ReadEepromTwice(session, instrument);
+    Service::OpenedInstrument instrument(session.Context(),
+                                         ChooseInstrument(session, options.memory.instrument));
+    const EepromImage image = ReadEepromTwice(instrument);
     file.Write(image);
     const bool isSane = IsSane(CheckImage(image));
     if (!isSane) {
@@ -58,9 +61,9 @@ void CheckBeforeWriting(Session& session, const WriteOptions& options, const Eep
         return;
     }
     if (!options.force) {
-        throw ToolFailure(ExitCode::BadData, ShownSource(options.file) + " is not written: " + errors,
-                          "`ostra eeprom check " + QuotedSource(options.file) +
-                              "` tells all; --force writes it all the same");
+        throw Failure(FailureKind::BadData, ShownSource(options.file) + " is not written: " + errors,
+                      "`ostra eeprom check " + QuotedSource(options.file) +
+                          "` tells all; --force writes it all the same");
     }
     session.Warn(ShownSource(options.file) + ": " + errors);
 }

@@ -5,10 +5,6 @@
 
 #include "Commands/CommonOptions.h"
 #include "Commands/Eeprom.h"
-#include "Memory/ImageCheck.h"
-#include "Memory/ImageDiff.h"
-#include "Memory/ImageEdit.h"
-#include "Memory/ImageModel.h"
 #include "Memory/InputFile.h"
 #include "Memory/MemoryTarget.h"
 #include "Output/Json.h"
@@ -17,9 +13,15 @@
 #include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
 #include "Protocol/PropertyIdentifiers.h"
+#include "Service/Memory/ImageCheck.h"
+#include "Service/Memory/ImageDiff.h"
+#include "Service/Memory/ImageEdit.h"
+#include "Service/Memory/ImageModel.h"
 
 namespace Varnholt::Cli {
 namespace {
+
+using namespace Service;
 
 namespace Map = Protocol::EepromMap;
 namespace Ids = Protocol::PropertyIds;
@@ -58,7 +60,7 @@ Json JsonOfImage(const MemoryTarget& target, ImageModel& model, const LogCopies&
               {"main", JsonOfCopy(copies.main)},
               {"second", JsonOfCopy(copies.second)},
               {"values", JsonOf(model.Log())}}},
-            {"binary", HexOf(BinaryBlockOf(target.Image()))},
+            {"binary", fmt::format("{:02x}", fmt::join(BinaryBlockOf(target.Image()), ""))},
             {"words", words}};
 }
 
@@ -118,7 +120,7 @@ void Check(Session& session, const ViewOptions& options) {
         session.Out() << target.Name() << (isSane ? " can be used\n" : " cannot be used as it is\n");
     }
     if (!isSane) {
-        throw ToolFailure(ExitCode::BadData, target.Name() + " has errors");
+        throw Failure(FailureKind::BadData, target.Name() + " has errors");
     }
 }
 
@@ -231,7 +233,7 @@ void Diff(Session& session, const DiffOptions& options) {
         PrintDiff(session, diff, nameOfA, b.Name());
     }
     if (!diff.IsEmpty()) {
-        throw ToolFailure(ExitCode::Different, nameOfA + " and " + b.Name() + " differ");
+        throw Failure(FailureKind::Different, nameOfA + " and " + b.Name() + " differ");
     }
 }
 

@@ -1,6 +1,5 @@
 #include <optional>
 
-#include "ChipId.h"
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
@@ -23,39 +22,38 @@ void List(Session& session, const Options& options) {
         return;
     }
     session.ChooseTransport(options.instrument.transport);
-    const bool isUsbIo = session.UsedTransport() == DeviceDriver::Ostra::Transport::UsbIo;
-    const std::vector<std::string> connected = ConnectedInstruments(session.UsedTransport());
+    const bool isUsbIo = session.Context().UsedTransport() == Service::Context::Transport::UsbIo;
+    const std::vector<std::string> connected = ListInstruments(session.Context());
     Json instruments = Json::array();
     Table table({{"NAME"}, {"IDENTIFIER"}, {options.chipId ? "CHIP ID" : ""}});
-    std::optional<FailureReport> failure;  // one that is used by others is none
+    std::optional<Failure> failure;  // one that is used by others is none
     for (const std::string& identifier : connected) {
-        Json instrument{{"identifier", identifier}, {"name", ShortNameOf(identifier)}};
+        Json instrument{{"identifier", identifier}, {"name", Service::ShortNameOf(identifier)}};
         std::string chipId;
         if (options.chipId) {
-            const ChipIdAnswer answer = AskChipId(session, identifier, options.instrument.transport);
-            const FailureReport& problem = answer.problem;
+            const Service::ChipIdAnswer answer = AskChipId(session.Context(), identifier);
             chipId = answer.chipId;
             instrument["chipId"] = chipId.empty() ? Json(nullptr) : Json(chipId);
-            if (chipId.empty()) {
+            if (answer.problem) {
                 chipId = "(not asked)";
-                instrument["problem"] = problem.message;
-                session.Warn(problem.message);
-                if (problem.code != ExitCode::NotAvailable && !failure) {
-                    failure = problem;
+                instrument["problem"] = answer.problem->what();
+                session.Warn(answer.problem->what());
+                if (ExitCodeOf(answer.problem->Kind()) != ExitCode::NotAvailable && !failure) {
+                    failure = answer.problem;
                 }
             }
         }
         instruments.push_back(instrument);
-        table.AddRow({ShortNameOf(identifier), identifier, chipId});
+        table.AddRow({Service::ShortNameOf(identifier), identifier, chipId});
     }
     if (options.json) {
         session.Print({{"transport", isUsbIo ? "usbio" : "native"}, {"instruments", instruments}});
     } else if (!connected.empty()) {
         table.Print(session.Out());
     }
-    FindInstrument(connected, {});  // says what to do when there is none
+    Service::FindInstrument(connected, {});  // says what to do when there is none
     if (failure) {
-        throw ToolFailure(failure->code, "not every instrument has told its chip id", failure->advice);
+        throw Failure(failure->Kind(), "not every instrument has told its chip id", failure->Advice());
     }
 }
 

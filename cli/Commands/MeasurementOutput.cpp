@@ -15,8 +15,8 @@ std::unique_ptr<RecordOutput> MakeRecordOutput(Session& session, const std::stri
     }
     if (isRaw) {
         if (session.OutFacts().isTerminal) {
-            throw ToolFailure(ExitCode::Usage, "raw bytes are no use on a terminal",
-                              "write them to a file: --output FILE");
+            throw Failure(FailureKind::BadArgument, "raw bytes are no use on a terminal",
+                          "write them to a file: --output FILE");
         }
         SetStandardOutputBinary();
     }
@@ -28,29 +28,24 @@ std::string CountText(std::uint64_t count, const std::string& noun) {
 }
 
 EarlyEnd EndEarly(const Session& session, RecordOutput& output, const std::string& noun, bool discard) {
-    EarlyEnd end{session.Explain(std::current_exception()), {}};
+    const Failure failure = session.Explain(std::current_exception());
+    const auto saying = [&failure](const std::string& what) {
+        return failure.Saying(failure.Message() + "; " + what);
+    };
     const std::uint64_t records = output.Records();
     if (records == 0) {
         output.Discard();
-        end.failure.message += "; nothing was recorded";
-        return end;
+        return {saying("nothing was recorded"), {}};
     }
     const std::string count = CountText(records, noun) + (records == 1 ? " was " : " were ");
     if (discard) {
         output.Discard();
-        end.failure.message += "; " + count + "thrown away";
-        return end;
+        return {saying(count + "thrown away"), {}};
     }
-    const RecordOutput::Remains remains = output.KeepWholeRecords();
-    end.file = remains.file;
-    end.failure.message += "; " + count + "written";
-    if (!remains.file.empty()) {
-        end.failure.message += " to " + remains.file;
-    }
-    if (!remains.earlier.empty()) {
-        end.failure.message += ", and " + remains.earlier + " is as it was";
-    }
-    return end;
+    const auto [file, earlier] = output.KeepWholeRecords();
+    return {saying(count + "written" + (file.empty() ? "" : " to " + file) +
+                   (earlier.empty() ? "" : ", and " + earlier + " is as it was")),
+            file};
 }
 
 }  // namespace Varnholt::Cli

@@ -19,8 +19,8 @@ std::string CountText(std::uint64_t count, const std::string& noun);
 
 /// How a measurement ended that did not come to its end.
 struct EarlyEnd {
-    FailureReport failure;  ///< says what became of the records
-    std::string file;       ///< that has them; empty: none
+    Failure failure;   ///< says what became of the records
+    std::string file;  ///< that has them; empty: none
 };
 /// While the failure is handled that was that end. `noun`: what is recorded, such as "record".
 EarlyEnd EndEarly(const Session& session, RecordOutput& output, const std::string& noun, bool discard);

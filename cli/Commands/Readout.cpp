@@ -1,5 +1,3 @@
-#include "Interface/Readout.h"
-
 #include <fmt/format.h>
 
 #include <algorithm>
@@ -10,12 +8,12 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
+#include "Commands/MeasurementOptions.h"
 #include "Commands/MeasurementOutput.h"
-#include "ElapsedTime.h"
-#include "Measurement.h"
 #include "Output/Json.h"
 #include "Output/LiveBlock.h"
 #include "Output/WallTimeText.h"
+#include "Service/ElapsedTime.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -32,15 +30,11 @@ struct Options {
 };
 
 using Values = std::array<std::int32_t, Protocol::ReadoutValues>;
-using RawReadout = std::array<std::uint8_t, Protocol::ReadoutBytes>;
 
 struct Readout {
     std::uint32_t number;  ///< from 1
     double seconds;        ///< since the first
-    Platform::WallTime time;
-    RawReadout bytes;
-
-    Values GetValues() const { return Interface::ReadoutFromBytes(bytes); }
+    Service::RawReadout raw;
 };
 
 std::string Summary(const Values& values) {
@@ -74,7 +68,7 @@ class Formatter final {
           isDrawnOver_(!GoesToFile(options_.output) && session_.OutFacts().isTerminal),
           block_(session_.OutFacts()) {}
 
-    void SetFacts(const MeasurementFacts& measurement) { facts_ = measurement; }
+    void SetFacts(const Service::MeasurementFacts& measurement) { facts_ = measurement; }
 
     /// What stands before the first readout.
     std::string Head() const {
@@ -87,9 +81,10 @@ class Formatter final {
     }
 
     std::string TextOf(const Readout& readout) {
-        const Values values = readout.GetValues();
+        const Values values = readout.raw.Values();
+        const Service::MeasurementParameters& p = facts_.parameters;
         if (options_.raw) {
-            return {readout.bytes.begin(), readout.bytes.end()};
+            return {readout.raw.bytes.begin(), readout.raw.bytes.end()};
         }
         if (options_.json) {
             std::ostringstream line;
@@ -97,15 +92,15 @@ class Formatter final {
                              {"readout", readout.number},
                              {"seconds", readout.seconds},
                              {"values", values},
-                             {"time", WallTimeText(readout.time)},
-                             {"parameters", {facts_.p1, facts_.p2, facts_.p3, facts_.p4}},
+                             {"time", WallTimeText(readout.raw.time)},
+                             {"parameters", {p.p1, p.p2, p.p3, p.p4}},
                              {"integrationTime", facts_.integrationTime}});
             return line.str();
         }
         if (options_.csv) {
             return fmt::format("{},{:.3f},{},{},{},{},{},{},{}\n", readout.number, readout.seconds,
-                               fmt::join(values, ","), WallTimeText(readout.time), facts_.p1, facts_.p2,
-                               facts_.p3, facts_.p4, facts_.integrationTime);
+                               fmt::join(values, ","), WallTimeText(readout.raw.time), p.p1, p.p2, p.p3, p.p4,
+                               facts_.integrationTime);
         }
         const std::string summary =
             (options_.repeat != 1 ? fmt::format("readout {}: ", readout.number) : "") + Summary(values);
@@ -139,32 +134,28 @@ class Formatter final {
     const std::string instrument_;
     const bool isDrawnOver_;
     LiveBlock block_;
-    MeasurementFacts facts_;
+    Service::MeasurementFacts facts_;
 };
 
 /// Waits until it is due, so many milliseconds after the first, and takes it.
-Readout Take(Session& session, Instrument& instrument, std::uint32_t number, std::uint64_t due,
-             ElapsedTime& time) {
+Readout Take(Service::OpenedInstrument& instrument, std::uint32_t number, std::uint64_t due,
+             Service::ElapsedTime& time) {
     const std::uint64_t elapsed = time.Milliseconds();
-    if (!session.UserInterruption().Sleep(static_cast<std::uint32_t>(due > elapsed ? due - elapsed : 0))) {
-        session.UserInterruption().ThrowIfRequested();
-    }
-    Readout readout{number, static_cast<double>(time.Milliseconds()) / 1000, Platform::WallClockNow(), {}};
-    instrument.Commands().MeasureRequest(readout.bytes.data(), Protocol::ReadoutBytes,
-                                         Interface::FixedReadout::Timeout);
-    return readout;
+    instrument.UsedContext().Sleep(static_cast<std::uint32_t>(due > elapsed ? due - elapsed : 0));
+    const double seconds = static_cast<double>(time.Milliseconds()) / 1000;
+    return {number, seconds, TakeReadout(instrument)};
 }
 
 /// Takes readouts until there are enough, or until the user ends what has no other end.
-void TakeSeries(Session& session, Instrument& instrument, const Options& options, Formatter& formatter,
-                RecordOutput& output, ElapsedTime& time) {
-    Progress progress = session.MakeProgress("taking", options.repeat, std::string(Noun) + "s");
+void TakeSeries(Session& session, Service::OpenedInstrument& instrument, const Options& options,
+                Formatter& formatter, RecordOutput& output, Service::ElapsedTime& time) {
+    const auto progress = session.StartProgress("taking", options.repeat, std::string(Noun) + "s");
     const auto interval = static_cast<std::uint64_t>(options.interval * 1000);
     for (std::uint32_t taken = 0; options.repeat == 0 || taken < options.repeat; ++taken) {
         Readout readout{};
         try {
             // The interval is from start to start, so that it does not drift.
-            readout = Take(session, instrument, taken + 1, taken * interval, time);
+            readout = Take(instrument, taken + 1, taken * interval, time);
         } catch (...) {
             if (options.repeat == 0 && taken > 0 && session.UserInterruption().IsRequested()) {
                 return;
@@ -176,19 +167,20 @@ void TakeSeries(Session& session, Instrument& instrument, const Options& options
         }
         output.Append(formatter.TextOf(readout), 1);
         if (GoesToFile(options.output)) {
-            progress.Update(taken + 1);
+            progress->Update(taken + 1);
         }
     }
 }
 
 void TakeInto(RecordOutput& output, Session& session, const Options& options) {
-    Instrument instrument(session, options.instrument);
+    Service::OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options.instrument));
+    const Service::MeasurementSettings settings = options.measurement.Settings();
     Formatter formatter(session, options, instrument.Identifier());
-    PrepareMeasurement(session, instrument, options.measurement);
+    PrepareMeasurement(instrument, settings);
     if (options.json || options.csv) {
-        formatter.SetFacts(FactsOf(instrument, options.measurement));
+        formatter.SetFacts(FactsOf(instrument, settings));
     }
-    ElapsedTime time;
+    Service::ElapsedTime time;
     TakeSeries(session, instrument, options, formatter, output, time);
     output.Complete();
     if (GoesToFile(options.output)) {
@@ -199,20 +191,20 @@ void TakeInto(RecordOutput& output, Session& session, const Options& options) {
 
 void TakeReadouts(Session& session, const Options& options) {
     if (int{options.json} + int{options.csv} + int{options.plot} + int{options.raw} > 1) {
-        throw ToolFailure(ExitCode::Usage, "--json, --csv, --plot and --raw exclude each other");
+        throw Failure(FailureKind::BadArgument, "--json, --csv, --plot and --raw exclude each other");
     }
     const auto output = MakeRecordOutput(session, options.output, options.raw);
     try {
         TakeInto(*output, session, options);
     } catch (...) {
-        const FailureReport failure = EndEarly(session, *output, Noun, false).failure;
+        const Failure failure = EndEarly(session, *output, Noun, false).failure;
         // The user's wish is the only end that it has.
-        if (options.repeat != 0 || failure.code != ExitCode::Interrupted || output->Records() > 0) {
-            throw ToolFailure(failure.code, failure.message, failure.advice);
+        if (options.repeat != 0 || failure.Kind() != FailureKind::Interrupted || output->Records() > 0) {
+            throw failure;
         }
         // Whoever wants a file is told that there is none.
         if (GoesToFile(options.output)) {
-            session.Note(failure.message);
+            session.Note(failure.what());
         }
     }
 }

@@ -10,12 +10,14 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
-#include "Linux/UdevRule.h"
 #include "Output/Json.h"
+#include "Service/Linux/UdevRule.h"
 #include "Utilities/Files/AtomicFile.h"
 
 namespace Varnholt::Cli {
 namespace {
+
+using namespace Service;
 
 struct Options {
     std::string id;
@@ -33,7 +35,7 @@ std::string RulesIn(const std::string& file) {
     }
     std::ifstream stream(file);
     if (!std::filesystem::is_regular_file(status) || !stream) {
-        throw ToolFailure(ExitCode::File, file + " cannot be read", "give a file of udev rules with --file");
+        throw Failure(FailureKind::File, file + " cannot be read", "give a file of udev rules with --file");
     }
     return {std::istreambuf_iterator<char>(stream), {}};
 }
@@ -43,9 +45,9 @@ void ChangeRules(const Options& options, const std::string& rules) {
         std::error_code error;
         std::filesystem::remove(options.file, error);
         if (error) {
-            throw ToolFailure(ExitCode::File,
-                              fmt::format("{} cannot be removed: {}", options.file, error.message()),
-                              "run it as root: sudo ostra register");
+            throw Failure(FailureKind::File,
+                          fmt::format("{} cannot be removed: {}", options.file, error.message()),
+                          "run it as root: sudo ostra register");
         }
         return;
     }
@@ -81,8 +83,8 @@ void Register(Session& session, const Options& options) {
     const RulesLeft left = WithoutRule(before, id);
     const std::string after = options.remove ? left.rules : WithRule(before, id);
     if (options.remove && !left.changed) {
-        throw ToolFailure(ExitCode::NoInstrument,
-                          fmt::format("{} is not registered in {}", options.id, options.file));
+        throw Failure(FailureKind::NotFound,
+                      fmt::format("{} is not registered in {}", options.id, options.file));
     }
     if (options.dryRun) {
         if (options.json) {
@@ -95,9 +97,8 @@ void Register(Session& session, const Options& options) {
         return;
     }
     if (geteuid() != 0 && options.file == UdevRuleFile) {
-        throw ToolFailure(
-            ExitCode::NotAvailable, fmt::format("only root may write {}", options.file),
-            fmt::format("sudo ostra register {}{}", options.remove ? "--remove " : "", options.id));
+        throw Failure(FailureKind::NoPermission, fmt::format("only root may write {}", options.file),
+                      fmt::format("sudo ostra register {}{}", options.remove ? "--remove " : "", options.id));
     }
     std::error_code ignored;
     std::filesystem::create_directories(std::filesystem::path(options.file).parent_path(), ignored);

@@ -2,6 +2,7 @@
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
 #include "Protocol/Instrument.h"
+#include "Service/OpenedInstrument.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -13,8 +14,8 @@ struct Options {
 };
 
 void Reset(Session& session, const Options& options) {
-    Instrument instrument(session, options.instrument);
-    instrument.Commands().Reset(options.code);
+    Service::OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options.instrument));
+    instrument.Reset(options.code);
     if (options.json) {
         session.Print({{"identifier", instrument.Identifier()}, {"code", options.code}});
     } else {

@@ -4,17 +4,16 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
+#include "Commands/MeasurementOptions.h"
 #include "Commands/MeasurementOutput.h"
-#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
-#include "Measurement.h"
 #include "Output/Json.h"
-#include "Protocol/Instrument.h"
-#include "ScanRecorder.h"
+#include "Output/ProgressLine.h"
+#include "Output/RecordWriter.h"
+#include "Service/ScanRun.h"
 
 namespace Varnholt::Cli {
 namespace {
 
-constexpr std::uint32_t LongestRecord = 6553;
 constexpr const char* Noun = "record";
 
 struct Options {
@@ -32,72 +31,25 @@ struct Options {
 /// How a scan ended, as its summary says it.
 struct Ending {
     const char* how = "complete";
+    bool isShort = false;  ///< the instrument stopped before its time
     std::uint64_t received = 0;
     double seconds = 0;
 };
 
-/// An instrument whose scan was cut off would go on streaming.
-void EndStream(Session& session, Instrument& instrument) {
-    session.Files().Resume();
-    try {
-        instrument.Commands().Reset(Protocol::OpeningResetCode);
-    } catch (...) {  // what ended the scan is what counts, and the next opening resets the instrument
-    }
-}
-
-/// Whether a transfer brought less than it should.
-bool IsShortfall(const std::exception_ptr& failure) {
-    try {
-        std::rethrow_exception(failure);
-    } catch (const DeviceDriver::Generic::Utilities::DeviceDriverException& exception) {
-        return exception.MissingData().has_value();
-    } catch (...) {
-        return false;
-    }
-}
-
-/// Runs the scan to its end, or until less comes than should. One that ends on this side leaves an instrument
-/// that has been reset.
-void RunScan(Session& session, Instrument& instrument, const Options& options, std::uint32_t total,
-             ScanRecorder& recorder) {
-    std::exception_ptr failure;
-    instrument.Commands().SetScanReceiver(&recorder);
-    try {
-        instrument.Commands().StartScan(options.recordSize, options.timeout, total);
-    } catch (...) {
-        failure = recorder.Failure() != nullptr ? recorder.Failure() : std::current_exception();
-    }
-    instrument.Commands().SetScanReceiver(nullptr);
-    // A transfer that was aborted can look like one with which the instrument has stopped.
-    const bool isComplete = failure == nullptr && total > 0 && recorder.Received() == total;
-    if (session.UserInterruption().IsRequested() && !isComplete) {
-        EndStream(session, instrument);
-        throw ToolFailure(ExitCode::Interrupted, instrument.Identifier() + ": scan interrupted");
-    }
-    if (recorder.Failure() != nullptr) {
-        EndStream(session, instrument);
-    }
-    // A transfer that brought less than it should is told as what is missing of the whole scan.
-    const bool isShort = total > 0 && failure != nullptr && IsShortfall(failure);
-    if (failure != nullptr && !isShort) {
-        std::rethrow_exception(failure);
-    }
-}
-
-std::uint32_t TotalOf(const Options& options, DeviceDriver::Ostra::Transport transport) {
+std::uint32_t TotalOf(const Options& options, Service::Context::Transport transport) {
     const std::uint64_t total =
         options.records > 0 ? std::uint64_t{options.records} * options.recordSize : options.total;
     if (total > 0xFFFFFFFF) {
-        throw ToolFailure(ExitCode::Usage, "a scan holds less than 4 GiB", "fewer --records");
+        throw Failure(FailureKind::BadArgument, "a scan holds less than 4 GiB", "fewer --records");
     }
     if (!options.raw && options.recordSize % 2 != 0) {
-        throw ToolFailure(ExitCode::Usage, "records of an odd number of bytes hold no 16-bit values",
-                          "an even --record-size, or --raw");
+        throw Failure(FailureKind::BadArgument, "records of an odd number of bytes hold no 16-bit values",
+                      "an even --record-size, or --raw");
     }
     // Its driver drops a last record that is not whole.
-    if (transport == DeviceDriver::Ostra::Transport::Native && total % options.recordSize != 0) {
-        throw ToolFailure(
-            ExitCode::Usage,
+    if (transport == Service::Context::Transport::Native && total % options.recordSize != 0) {
+        throw Failure(
+            FailureKind::BadArgument,
             fmt::format("over the transport native --total is a multiple of --record-size: {} is none of {}",
                         total, options.recordSize),
             "another --total or --record-size, or --transport usbio");
@@ -132,76 +84,65 @@ void PrintSummary(Session& session, const Options& options, const std::string& i
 }
 
 /// Scans into the output and completes it. `ending` is kept up to date, for whoever catches a failure.
-void ScanInto(RecordOutput& output, Session& session, Instrument& instrument, const Options& options,
-              std::uint32_t total, Ending& ending) {
-    PrepareMeasurement(session, instrument, options.measurement);
-    ElapsedTime time;
-    {
-        Progress progress = session.MakeProgress("scanning", total, "B");
-        ScanRecorder recorder(
-            {options.recordSize, options.raw, options.header, {options.number, options.time}}, output,
-            [&](std::uint64_t bytes) { progress.Update(bytes); });
-        const auto note = [&] {
-            ending.received = recorder.Received();
-            ending.seconds = static_cast<double>(time.Milliseconds()) / 1000;
-        };
-        try {
-            RunScan(session, instrument, options, total, recorder);
-        } catch (...) {
-            note();
-            throw;
-        }
+void ScanInto(RecordOutput& output, Session& session, Service::OpenedInstrument& instrument,
+              const Options& options, std::uint32_t total, Ending& ending) {
+    PrepareMeasurement(instrument, options.measurement.Settings());
+    Service::ElapsedTime time;
+    Service::ScanReport report;
+    const auto note = [&] {
+        ending.received = report.received;
+        ending.seconds = static_cast<double>(time.Milliseconds()) / 1000;
+    };
+    RecordWriter writer({options.recordSize, options.raw, options.header, {options.number, options.time}},
+                        output);
+    try {
+        RunScan(instrument, {options.recordSize, total, options.timeout}, writer, report);
+    } catch (...) {
         note();
-        if (ending.received < total) {
-            ending.how = "short";
-            throw ToolFailure(
-                ExitCode::InputOutput,
-                fmt::format("{}: the instrument stopped: {} of {} bytes came", instrument.Identifier(),
-                            ending.received, total),
-                "a smaller --total, or none: then the scan is as long as the instrument makes it");
-        }
-        if (const auto rest = recorder.LeftOver(); !rest.empty()) {
-            if (options.raw) {
-                output.Append({reinterpret_cast<const char*>(rest.data()), rest.size()}, 0);
-            } else {
-                session.Warn(
-                    fmt::format("the last {} bytes are no whole record and were left out", rest.size()));
-            }
+        ending.isShort = report.hasStoppedEarly;
+        throw;
+    }
+    if (const auto& rest = report.leftOver; !rest.empty()) {
+        if (options.raw) {
+            output.Append({reinterpret_cast<const char*>(rest.data()), rest.size()}, 0);
+        } else {
+            session.Warn(fmt::format("the last {} bytes are no whole record and were left out", rest.size()));
         }
     }
     output.Complete();
-    ending.seconds = static_cast<double>(time.Milliseconds()) / 1000;
+    note();
 }
 
 void CheckForm(const Options& options) {
     if (options.json && !GoesToFile(options.output)) {
-        throw ToolFailure(ExitCode::Usage, "--json prints on standard output, and the records go there",
-                          "write them to a file: --output FILE");
+        throw Failure(FailureKind::BadArgument, "--json prints on standard output, and the records go there",
+                      "write them to a file: --output FILE");
     }
     if (options.discard && !GoesToFile(options.output)) {
-        throw ToolFailure(ExitCode::Usage, "what is printed cannot be thrown away",
-                          "write to a file: --output FILE");
+        throw Failure(FailureKind::BadArgument, "what is printed cannot be thrown away",
+                      "write to a file: --output FILE");
     }
 }
 
 void Scan(Session& session, const Options& options) {
     session.ChooseTransport(options.instrument.transport);
-    const std::uint32_t total = TotalOf(options, session.UsedTransport());
+    const std::uint32_t total = TotalOf(options, session.Context().UsedTransport());
     CheckForm(options);
     const auto output = MakeRecordOutput(session, options.output, options.raw);
     std::string identifier;
     Ending ending;
     try {
-        Instrument instrument(session, options.instrument);
+        Service::OpenedInstrument instrument(session.Context(),
+                                             ChooseInstrument(session, options.instrument));
         identifier = instrument.Identifier();
         ScanInto(*output, session, instrument, options, total, ending);
     } catch (...) {
         const EarlyEnd end = EndEarly(session, *output, Noun, options.discard);
         if (options.json && !identifier.empty()) {
-            ending.how = std::string_view(ending.how) == "short" ? ending.how : NameOf(end.failure.code);
+            ending.how = ending.isShort ? "short" : NameOf(ExitCodeOf(end.failure.Kind()));
             PrintSummary(session, options, identifier, *output, ending, end.file);
         }
-        throw ToolFailure(end.failure.code, end.failure.message, end.failure.advice);
+        throw end.failure;
     }
     if (options.json) {
         PrintSummary(session, options, identifier, *output, ending, options.output);
@@ -231,7 +172,7 @@ void AddScan(CommandSpec app, Session& session) {
         .Excludes("--total");
     command.Add("--record-size", options->recordSize, "bytes of a record, 1 to 6553 (default: 256)")
         .Type("BYTES")
-        .Between(1, LongestRecord);
+        .Between(1, Service::LongestScanRecord);
     command.Add("--timeout", options->timeout, "seconds that a transfer may take (default: 5)")
         .Type("S")
         .Between(0, 86400);

@@ -4,15 +4,17 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
-#include "Memory/ImageEdit.h"
 #include "Memory/MemoryTarget.h"
-#include "Number.h"
 #include "Output/Json.h"
 #include "Output/Table.h"
 #include "Protocol/PropertyIdentifiers.h"
+#include "Service/Memory/ImageEdit.h"
+#include "Service/Number.h"
 
 namespace Varnholt::Cli {
 namespace {
+
+using namespace Service;
 
 struct GetOptions {
     MemoryOptions memory;
@@ -56,8 +58,8 @@ void Put(Session& session, const PutOptions& options) {
     for (const Assignment& assignment : ParseAssignments(options.assignments)) {
         std::uint64_t value = 0;
         if (!ParseNumber(assignment.value, std::numeric_limits<std::uint32_t>::max(), value)) {
-            throw ToolFailure(ExitCode::Usage, "'" + assignment.value + "' is no 32-bit number",
-                              "for example 10200=0x01020304");
+            throw Failure(FailureKind::BadArgument, "'" + assignment.value + "' is no 32-bit number",
+                          "for example 10200=0x01020304");
         }
         words.push_back({assignment.id, static_cast<std::uint32_t>(value)});
     }

@@ -2,10 +2,10 @@
 
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
-#include "Memory/EepromWrite.h"
 #include "Memory/InputFile.h"
 #include "Output/Json.h"
 #include "Protocol/Instrument.h"
+#include "Service/Memory/EepromAccess.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -17,13 +17,14 @@ struct Options {
 };
 
 void WriteImage(Session& session, const Options& options) {
-    const EepromImage image = ReadImageFile(session, options.file);
-    Instrument instrument(session, options.instrument, Instrument::Choice::MustBeNamed);
-    std::vector<WritePiece> pieces;
+    const Service::EepromImage image = ReadImageFile(session, options.file);
+    Service::OpenedInstrument instrument(session.Context(),
+                                         ChooseInstrument(session, options.instrument, Choice::MustBeNamed));
+    std::vector<Service::WritePiece> pieces;
     for (std::uint32_t at = 0; at < Protocol::EepromSize; at += Protocol::EepromWritePiece) {
         pieces.push_back({at, Protocol::EepromWritePiece});
     }
-    WriteEeprom(session, instrument, image, pieces,
+    WriteEeprom(instrument, image, pieces,
                 "the EEPROM may be neither the old nor the new one: write an image again");
     if (options.json) {
         session.Print(

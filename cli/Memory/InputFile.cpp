@@ -17,8 +17,8 @@ void Await(Session& session, ByteSource& source, const std::string& name) {
     for (std::uint32_t waited = 0; !source.Wait(lookEvery); waited += lookEvery) {
         session.UserInterruption().ThrowIfRequested();
         if (waited >= session.InputPatience()) {
-            throw ToolFailure(ExitCode::File, "nothing comes from " + ShownSource(name),
-                              "whatever writes into it must do so while this command runs");
+            throw Failure(FailureKind::File, "nothing comes from " + ShownSource(name),
+                          "whatever writes into it must do so while this command runs");
         }
     }
     session.UserInterruption().ThrowIfRequested();
@@ -30,14 +30,14 @@ std::vector<std::uint8_t> ReadFileUpTo(Session& session, const std::string& name
     if (name == StandardStream) {
         session.ClaimIn();
     } else if (std::filesystem::is_directory(name, error)) {
-        throw ToolFailure(ExitCode::File, "cannot read " + name + ": it is a directory");
+        throw Failure(FailureKind::File, "cannot read " + name + ": it is a directory");
     }
     const std::unique_ptr<ByteSource> source = name == StandardStream
                                                    ? Utilities::Files::OpenStandardInput()
                                                    : Utilities::Files::OpenByteSource(name);
     if (source->IsTerminal()) {
-        throw ToolFailure(ExitCode::Usage, ShownSource(name) + " is a terminal: nobody types raw bytes",
-                          "name a file, or let a pipe bring it");
+        throw Failure(FailureKind::BadArgument, ShownSource(name) + " is a terminal: nobody types raw bytes",
+                      "name a file, or let a pipe bring it");
     }
     return Utilities::Files::ReadUpTo(*source, limit, [&] { Await(session, *source, name); });
 }
@@ -59,13 +59,13 @@ std::vector<std::uint8_t> ReadFileOfSize(Session& session, const std::string& na
         const std::string found =
             content.size() > size ? "more than " + std::to_string(size) + " bytes"
                                   : std::to_string(content.size()) + " bytes, not " + std::to_string(size);
-        throw ToolFailure(ExitCode::BadData, ShownSource(name) + " is not " + what + ": it has " + found,
-                          advice);
+        throw Failure(FailureKind::BadData, ShownSource(name) + " is not " + what + ": it has " + found,
+                      advice);
     }
     return content;
 }
 
-EepromImage ReadImageFile(Session& session, const std::string& name) {
+Service::EepromImage ReadImageFile(Session& session, const std::string& name) {
     return ReadFileOfSize(
         session, name, Protocol::EepromSize, "an EEPROM image",
         "`ostra eeprom backup FILE` makes one from an instrument, `ostra eeprom new FILE` a fresh one");

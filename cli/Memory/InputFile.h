@@ -4,6 +4,8 @@
 #include <string>
 #include <vector>
 
+#include "Service/Memory/EepromImage.h"
+
 namespace Varnholt::Cli {
 
 /// What stands for standard input or output in the place of a file's name.
@@ -13,18 +15,15 @@ std::string ShownSource(const std::string& name);
 /// ... and as a command line takes it.
 std::string QuotedSource(const std::string& name);
 
-/// The content of an EEPROM, 8192 bytes.
-using EepromImage = std::vector<std::uint8_t>;
-
 class Session;
 
 /// The content of a file, a pipe or, for "-", of standard input when it has exactly `size` bytes; `what` a
-/// file of that size is, with its article, is for the message. Throws `ToolFailure`: `ExitCode::File` when it
+/// file of that size is, with its article, is for the message. Throws `Failure`: `ExitCode::File` when it
 /// cannot be read or brings nothing for long, `ExitCode::BadData` when it has another size.
 std::vector<std::uint8_t> ReadFileOfSize(Session& session, const std::string& name, std::size_t size,
                                          const std::string& what, const std::string& advice = {});
 
 /// An image, as far as its size tells.
-EepromImage ReadImageFile(Session& session, const std::string& name);
+Service::EepromImage ReadImageFile(Session& session, const std::string& name);
 
 }  // namespace Varnholt::Cli

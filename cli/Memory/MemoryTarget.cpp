@@ -6,47 +6,25 @@
 #include <ostream>
 
 #include "Commands/CommonOptions.h"
-#include "Memory/ImageCheck.h"
 #include "Memory/InputFile.h"
 #include "Output/Json.h"
-#include "Platform/Time.h"
+#include "Service/Memory/ImageCheck.h"
 #include "Terminal.h"
 #include "Utilities/Files/AtomicFile.h"
-#include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Cli {
 namespace {
 
-using Utilities::Files::AtomicFile;
+using namespace Service;
+
 using Utilities::Files::WriteFileAtomically;
 
 /// What is read once and then written could be two different things.
 void RefuseToChangeInPlace(const std::string& file) {
     std::error_code error;
     if (file != StandardStream && std::filesystem::is_other(file, error)) {
-        throw ToolFailure(
-            ExitCode::Usage, file + " is no ordinary file and cannot be changed",
-            "`--image -` reads standard input and writes what becomes of it to standard output");
-    }
-}
-
-/// A name that tells instrument, chip and time, and that no file has yet.
-std::string NewBackupName(const std::string& identifier, const std::string& chipId) {
-    std::string name = ShortNameOf(identifier);
-    for (char& c : name) {
-        const bool isPlain = (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
-                             c == '-' || c == '.' || c == '_';
-        c = isPlain ? c : '_';
-    }
-    const Platform::CalendarTime now = Platform::LocalCalendarTime(Platform::WallClockNow().seconds);
-    const std::string base = fmt::format("ostra-{}-{}-{:04}{:02}{:02}-{:02}{:02}{:02}", name, chipId,
-                                         now.year, now.month, now.day, now.hour, now.minute, now.second);
-    std::error_code error;
-    for (int number = 1;; ++number) {
-        const std::string candidate = base + (number == 1 ? "" : fmt::format("-{}", number)) + ".eeprom";
-        if (!std::filesystem::exists(candidate, error)) {
-            return candidate;
-        }
+        throw Failure(FailureKind::BadArgument, file + " is no ordinary file and cannot be changed",
+                      "`--image -` reads standard input and writes what becomes of it to standard output");
     }
 }
 
@@ -102,16 +80,16 @@ MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, U
         image_ = ReadImageFile(session_, file_);
         return;
     }
-    instrument_.emplace(
-        session_, options.instrument,
-        use == Use::Change ? Instrument::Choice::MustBeNamed : Instrument::Choice::FirstWillDo);
+    instrument_.emplace(session_.Context(),
+                        ChooseInstrument(session_, options.instrument,
+                                         use == Use::Change ? Choice::MustBeNamed : Choice::FirstWillDo));
     name_ = instrument_->Identifier();
-    image_ = ReadEepromTwice(session_, *instrument_);
+    image_ = ReadEepromTwice(*instrument_);
 }
 
-ToolFailure MemoryTarget::Unusable(const std::string& reason) const {
-    const std::string which = instrument_ ? "--device " + ShortNameOf(name_) : QuotedSource(file_);
-    return {ExitCode::BadData, name_ + ": the driver cannot use what is in it: " + reason,
+Failure MemoryTarget::Unusable(const std::string& reason) const {
+    const std::string which = instrument_ ? "--device " + Service::ShortNameOf(name_) : QuotedSource(file_);
+    return {FailureKind::BadData, name_ + ": the driver cannot use what is in it: " + reason,
             "`ostra eeprom check " + which + "` tells what is wrong with it"};
 }
 
@@ -125,23 +103,14 @@ std::string MemoryTarget::MakeBackup(const ChangeOptions& options) {
         session_.Note("backup of " + name_ + " written to standard output");
         return options.backupFile;
     }
-    std::string backup = options.backupFile;
-    if (!backup.empty()) {
-        WriteFileAtomically(backup, image_, AtomicFile::IfItExists::Refuse);
-    } else {
-        backup = NewBackupName(name_, instrument_->ChipId());
-        try {
-            WriteFileAtomically(backup, image_, AtomicFile::IfItExists::Refuse);
-        } catch (const Utilities::Files::FileError& failure) {
-            throw ToolFailure(
-                ExitCode::File,
-                std::string("no backup can be made in the current folder, and nothing was changed: ") +
-                    failure.what(),
-                "--backup FILE makes it elsewhere; --no-backup leaves it out");
+    try {
+        return SaveBackup(*instrument_, image_, options.backupFile);
+    } catch (const Failure& failure) {
+        if (options.backupFile.empty() && failure.Kind() == FailureKind::File) {
+            throw failure.Advising("--backup FILE makes it elsewhere; --no-backup leaves it out");
         }
+        throw;
     }
-    session_.Note("backup of " + name_ + " written to " + backup);
-    return backup;
 }
 
 std::string MemoryTarget::WayBack(const std::string& backup) const {
@@ -151,7 +120,7 @@ std::string MemoryTarget::WayBack(const std::string& backup) const {
     const bool isPiped = backup == StandardStream;
     return fmt::format("this brings back what was there before{}: ostra eeprom restore {} --device {}{}",
                        isPiped ? " (FILE: what went to standard output)" : "",
-                       isPiped ? "FILE" : QuotedFileName(backup), ShortNameOf(name_),
+                       isPiped ? "FILE" : QuotedFileName(backup), Service::ShortNameOf(name_),
                        IsSane(CheckImage(image_)) ? "" : " --force");
 }
 
@@ -159,11 +128,14 @@ MemoryTarget::Outcome MemoryTarget::Change(const EepromImage& wanted, const Chan
                                            Granularity granularity) {
     Outcome outcome{options.dryRun, CountDifferences(image_, wanted), 0, {}};
     if (instrument_) {
-        const std::vector<WritePiece> pieces = PiecesToWrite(image_, wanted, granularity);
-        outcome.pieces = pieces.size();
-        if (!options.dryRun && !pieces.empty()) {
-            outcome.backup = MakeBackup(options);
-            WriteEeprom(session_, *instrument_, wanted, pieces, WayBack(outcome.backup));
+        if (options.dryRun) {
+            outcome.pieces = PiecesToWrite(image_, wanted, granularity).size();
+        } else {
+            const auto [pieces, backup] = ChangeEeprom(
+                *instrument_, image_, wanted, granularity,
+                {[&] { return MakeBackup(options); }, [this](const auto& kept) { return WayBack(kept); }});
+            outcome.pieces = pieces;
+            outcome.backup = backup;
         }
     } else if (!options.dryRun && file_ == StandardStream) {
         session_.ClaimOut();

@@ -4,8 +4,9 @@
 #include <optional>
 #include <string>
 
-#include "CommandSpec.h"
-#include "Memory/EepromWrite.h"
+#include "Commands/CommonOptions.h"
+#include "Service/Memory/EepromAccess.h"
+#include "Service/OpenedInstrument.h"
 #include "Utilities/Exceptions/Exceptions.h"
 
 namespace Varnholt::Cli {
@@ -44,9 +45,9 @@ class MemoryTarget final {
 
     /// The instrument's identifier or the file's name.
     const std::string& Name() const { return name_; }
-    const EepromImage& Image() const { return image_; }
+    const Service::EepromImage& Image() const { return image_; }
 
-    /// What `read` makes of the image's values. The memory model's refusal of an image is a `ToolFailure`
+    /// What `read` makes of the image's values. The memory model's refusal of an image is a `Failure`
     /// that names the image and how to look into it.
     template <class Read>
     auto Interpret(Read read) const {
@@ -66,21 +67,22 @@ class MemoryTarget final {
     };
     /// Makes the content `wanted`. A file is replaced as a whole. Of an instrument a backup is made, only
     /// what differs is written, and all is read back.
-    Outcome Change(const EepromImage& wanted, const ChangeOptions& options, Granularity granularity);
+    Outcome Change(const Service::EepromImage& wanted, const ChangeOptions& options,
+                   Service::Granularity granularity);
 
     /// Tells the user of a change; as JSON if it is wanted, then with the members of `details` as well.
     void Report(const Outcome& outcome, bool asJson, const nlohmann::ordered_json& details) const;
 
   private:
-    ToolFailure Unusable(const std::string& reason) const;
+    Failure Unusable(const std::string& reason) const;
     std::string MakeBackup(const ChangeOptions& options);
     std::string WayBack(const std::string& backup) const;
 
     Session& session_;
     std::string file_;
-    std::optional<Instrument> instrument_;
+    std::optional<Service::OpenedInstrument> instrument_;
     std::string name_;
-    EepromImage image_;
+    Service::EepromImage image_;
 };
 
 }  // namespace Varnholt::Cli

@@ -24,8 +24,8 @@ NewFile::NewFile(Session& usedSession, const NewFileOptions& chosen)
     std::error_code error;
     replaces_ = options_.force || std::filesystem::is_other(options_.name, error);
     if (!replaces_ && std::filesystem::is_regular_file(options_.name, error)) {
-        throw ToolFailure(ExitCode::File, options_.name + " exists already",
-                          "--force replaces it; or name a file that does not exist yet");
+        throw Failure(FailureKind::File, options_.name + " exists already",
+                      "--force replaces it; or name a file that does not exist yet");
     }
 }
 

@@ -5,12 +5,13 @@
 
 namespace Varnholt::Cli {
 
-DescriptorStream::DescriptorStream(OutputDescriptor target, const Interruption& userInterruption, Lost lost)
+DescriptorStream::DescriptorStream(OutputDescriptor target, const Service::Interruption& userInterruption,
+                                   Lost lost)
     : std::ostream(nullptr), buffer_(std::move(target), userInterruption, lost) {
     rdbuf(&buffer_);
 }
 
-DescriptorStream::Buffer::Buffer(OutputDescriptor openTarget, const Interruption& userInterruption,
+DescriptorStream::Buffer::Buffer(OutputDescriptor openTarget, const Service::Interruption& userInterruption,
                                  Lost whatIsLost)
     : target_(std::move(openTarget)), interruption_(userInterruption), lost_(whatIsLost) {
     setp(room_.data(), room_.data() + room_.size());

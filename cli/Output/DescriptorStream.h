@@ -16,12 +16,12 @@ class DescriptorStream final : public std::ostream {
         IsIgnored,  ///< for messages: the next one may get through
     };
     /// `userInterruption` outlives the stream.
-    DescriptorStream(OutputDescriptor target, const Interruption& userInterruption, Lost lost);
+    DescriptorStream(OutputDescriptor target, const Service::Interruption& userInterruption, Lost lost);
 
   private:
     class Buffer final : public std::streambuf {
       public:
-        Buffer(OutputDescriptor openTarget, const Interruption& userInterruption, Lost whatIsLost);
+        Buffer(OutputDescriptor openTarget, const Service::Interruption& userInterruption, Lost whatIsLost);
         ~Buffer() override;
 
       protected:
@@ -33,7 +33,7 @@ class DescriptorStream final : public std::ostream {
         std::size_t Write(std::span<const char> bytes);
 
         OutputDescriptor target_;
-        const Interruption& interruption_;
+        const Service::Interruption& interruption_;
         const Lost lost_;
         std::array<char, 16384> room_{};
     };

@@ -40,12 +40,4 @@ Json JsonOf(const Property& value) {
     return elements.size() == 1 ? elements.front() : elements;
 }
 
-std::string HexOf(std::span<const std::uint8_t> bytes) {
-    std::string text;
-    for (const std::uint8_t byte : bytes) {
-        text += fmt::format("{:02x}", byte);
-    }
-    return text;
-}
-
 }  // namespace Varnholt::Cli

@@ -3,7 +3,6 @@
 #include <cstdint>
 #include <iosfwd>
 #include <nlohmann/json.hpp>
-#include <span>
 #include <string>
 
 #include "DeviceDriver/Generic/Configuration/Property.h"
@@ -20,8 +19,5 @@ void PrintJson(std::ostream& stream, const Json& value);
 Json JsonOf(float value);
 /// A number, or an array where the value has another number of elements than one.
 Json JsonOf(const DeviceDriver::Generic::Configuration::Property& value);
-
-/// "1f00a2"
-std::string HexOf(std::span<const std::uint8_t> bytes);
 
 }  // namespace Varnholt::Cli

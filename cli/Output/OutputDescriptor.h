@@ -7,7 +7,7 @@
 #include <string>
 #include <system_error>
 
-#include "Interruption.h"
+#include "Service/Interruption.h"
 
 namespace Varnholt::Cli {
 
@@ -22,7 +22,7 @@ class OutputDescriptor final {
     static OutputDescriptor Create(const std::string& path, std::error_code& error);
     /// What is there and is no ordinary file. Waits for the reader of a FIFO, until the user wants to end:
     /// then the error is `std::errc::operation_canceled`.
-    static OutputDescriptor Open(const std::string& path, const Interruption& interruption,
+    static OutputDescriptor Open(const std::string& path, const Service::Interruption& interruption,
                                  std::error_code& error);
 
     OutputDescriptor(OutputDescriptor&& other) noexcept;
@@ -36,7 +36,7 @@ class OutputDescriptor final {
     /// What cannot take more at the moment is waited for. Once the user wants to end, it is waited for no
     /// longer than a moment in all; what then has no room is refused with `std::errc::operation_canceled`.
     /// On Windows an interruption shows between two pieces only, not while a pipe is full.
-    Outcome Write(std::span<const char> bytes, const Interruption& interruption);
+    Outcome Write(std::span<const char> bytes, const Service::Interruption& interruption);
 
     /// Of a file: ends it there.
     std::error_code Cut(std::uint64_t size);
@@ -48,8 +48,8 @@ class OutputDescriptor final {
     enum class Ownership { Own, Borrowed };
     OutputDescriptor(int openDescriptor, Ownership ownership);
 
-    int WaitingTime(const Interruption& interruption);
-    std::error_code AwaitRoom(const Interruption& interruption);
+    int WaitingTime(const Service::Interruption& interruption);
+    std::error_code AwaitRoom(const Service::Interruption& interruption);
 
     int descriptor_;  ///< -1: closed
     bool isOwn_;

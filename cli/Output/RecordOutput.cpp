@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "Failure.h"
+#include "ExitCode.h"
 
 namespace Varnholt::Cli {
 
@@ -24,7 +24,7 @@ void RecordOutput::Append(std::span<const char> block, std::uint64_t blockRecord
         wholeBytes_ += static_cast<std::uint64_t>(part.rend() - lastEnd);
     }
     if (taken.error == std::errc::operation_canceled) {
-        throw ToolFailure(ExitCode::Interrupted, "interrupted");
+        throw Failure(FailureKind::Interrupted, "interrupted");
     }
     Fail(taken.error);
 }

@@ -9,7 +9,7 @@ namespace Varnholt::Cli {
 
 /// Where the records of a measurement go while they are taken, and what becomes of them at its end. Knows at
 /// any time how many records are there whole. Failures are `FileError` or, when the user wants
-/// to end while something is waited for, `ToolFailure` with `ExitCode::Interrupted`.
+/// to end while something is waited for, `Failure` with `ExitCode::Interrupted`.
 class RecordOutput {
   public:
     RecordOutput() = default;

@@ -20,7 +20,7 @@ path PartialFor(const FinalName& name) {
 
 }  // namespace
 
-RecordingFile::RecordingFile(const std::string& name, const Interruption& userInterruption)
+RecordingFile::RecordingFile(const std::string& name, const Service::Interruption& userInterruption)
     : finalName_(name),
       interruption_(userInterruption),
       partial_(PartialFor(finalName_)),

@@ -16,7 +16,7 @@ namespace Varnholt::Cli {
 class RecordingFile final : public RecordOutput {
   public:
     /// `userInterruption` outlives the object.
-    RecordingFile(const std::string& name, const Interruption& userInterruption);
+    RecordingFile(const std::string& name, const Service::Interruption& userInterruption);
     /// Without a word on what it is to become, it ends early and keeps what there is.
     ~RecordingFile() override;
 
@@ -30,7 +30,7 @@ class RecordingFile final : public RecordOutput {
     OutputDescriptor Open();
 
     const Utilities::Files::FinalName finalName_;
-    const Interruption& interruption_;
+    const Service::Interruption& interruption_;
     const std::filesystem::path partial_;  ///< empty: written directly
     OutputDescriptor descriptor_;
     bool isOpen_ = true;

@@ -5,11 +5,13 @@
 
 #include <algorithm>
 
-#include "Memory/PropertyText.h"
 #include "Output/Table.h"
+#include "Service/Memory/PropertyText.h"
 
 namespace Varnholt::Cli {
 namespace {
+
+using namespace Service;
 
 using DeviceDriver::Generic::Configuration::Properties;
 

@@ -187,7 +187,7 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
             if (existed) {
                 WriteFile(folder_.Path("csv"), {1});
             }
-            Cli::Interruption interruption;
+            Service::Interruption interruption;
             tool_.interruption = &interruption;
             const auto event = After(row.interruptedAt, [&] { interruption.Request(); });
             Fail({"readout", "--csv", "--repeat", row.repeat, "--interval", "1", "--output",
@@ -302,7 +302,7 @@ TEST_P(InstrumentCommandsTest, MonitorEndsInTimeAndWithCtrlC) {
     Succeed({"monitor", "--for", "3"});
     watch.ExpectBetween(3000, 3100);
     EXPECT_EQ(tool_.Out(), "");
-    Cli::Interruption interruption;
+    Service::Interruption interruption;
     tool_.interruption = &interruption;
     After(1'000'000, [&] { interruption.Request(); });
     Succeed({"monitor"});

@@ -6,28 +6,28 @@
 #include <numeric>
 #include <thread>
 
-#include "Memory/ImageEdit.h"
-#include "Memory/ImageModel.h"
 #include "Protocol/ByteOrder.h"
+#include "Service/Memory/ImageEdit.h"
+#include "Service/Memory/ImageModel.h"
 #include "ToolFixture.h"
 
 namespace Varnholt::Tests {
 namespace {
 
-using Cli::EepromImage;
 using Cli::ExitCode;
+using Service::EepromImage;
 using testing::HasSubstr;
 using testing::Not;
 
 EepromImage Calibrated(const char* value) {
-    return Cli::WithCalibration(Cli::FreshImage(), {{1211, value}}).image;
+    return Service::WithCalibration(Service::FreshImage(), {{1211, value}}).image;
 }
 
 class MemoryCommandsTest : public ToolTest {
   protected:
     MemoryCommandsTest() : instrument_(host_.Add("sim")) {
         EepromImage content = Calibrated("77");
-        Cli::SetRawWord(content, 10203, 0xCAFE);
+        Service::SetRawWord(content, 10203, 0xCAFE);
         std::fill(content.begin() + 1064, content.begin() + 2048, std::uint8_t{0x5A});
         instrument_.SetEeprom(content);
         before_ = instrument_.Eeprom();
@@ -84,7 +84,7 @@ TEST_P(MemoryCommandsTest, ReadingChangesNothing) {
         }
     }
     EXPECT_EQ(ReadFile(backup_), before_);
-    EXPECT_EQ(ReadFile(folder_.Path("block")), Cli::BinaryBlockOf(before_));
+    EXPECT_EQ(ReadFile(folder_.Path("block")), Service::BinaryBlockOf(before_));
 }
 
 TEST_P(MemoryCommandsTest, ShowTellsWhatIsInTheEeprom) {
@@ -201,8 +201,8 @@ TEST_P(MemoryCommandsTest, FilesThatAreMadeReplaceOthersByForceOnly) {
     };
     for (const Case& row : {
              Case{{"eeprom", "backup"}, before_},
-             Case{{"eeprom", "new"}, Cli::FreshImage()},
-             Case{{"binary", "get"}, Cli::BinaryBlockOf(before_)},
+             Case{{"eeprom", "new"}, Service::FreshImage()},
+             Case{{"binary", "get"}, Service::BinaryBlockOf(before_)},
          }) {
         const auto with = [&row](const Arguments& more) {
             Arguments arguments = row.command;
@@ -318,7 +318,7 @@ TEST_P(MemoryCommandsTest, PipesAreNotWaitedForWithoutEnd) {
     tool_.inputPatience = 1;
     Fail({"eeprom", "check", pipe}, ExitCode::File, "nothing comes from " + pipe);
     tool_.inputPatience = std::numeric_limits<std::uint32_t>::max();
-    Cli::Interruption interruption;
+    Service::Interruption interruption;
     tool_.interruption = &interruption;
     const auto write = [&](const std::function<void(std::ofstream & file)>& action) {
         return std::thread([&pipe, action] {
@@ -359,7 +359,7 @@ TEST_P(MemoryCommandsTest, AFolderThatTakesNoBackupIsSaidToBe) {
 TEST_P(MemoryCommandsTest, AFailedWriteTellsTheWayBack) {
     EepromImage wanted = before_;
     std::fill(wanted.begin() + 1100, wanted.begin() + 4000, std::uint8_t{0x77});
-    WriteFile(image_, Cli::WithCalibration(wanted, {{1211, "5"}}).image);
+    WriteFile(image_, Service::WithCalibration(wanted, {{1211, "5"}}).image);
     int failures = 0;
     for (std::uint32_t piece = 0;; ++piece) {
         instrument_.SetEeprom(before_);
@@ -389,7 +389,7 @@ TEST_P(MemoryCommandsTest, CtrlCEndsAWriteBetweenTwoPieces) {
     EepromImage wanted = before_;
     std::fill(wanted.begin() + 5000, wanted.end(), std::uint8_t{0x77});
     WriteFile(image_, wanted);
-    Cli::Interruption interruption;
+    Service::Interruption interruption;
     tool_.interruption = &interruption;
     // In the middle of the fifth piece.
     SetFaults("bulk-out 12:late=400");
@@ -427,10 +427,10 @@ TEST_P(MemoryCommandsTest, ChangesOfAnImageFileNeedNoInstrument) {
     Succeed({"binary", "put", folder_.Path("block"), "--image", image_});
     Succeed({"log", "reset", "--image", image_});
     EepromImage expected = Calibrated("5");
-    Cli::SetRawWord(expected, 10200, 7);
-    Cli::SetRawWord(expected, 10201, 0xFFFF0000);
-    Cli::SetRawWord(expected, 10203, 0xCAFE);
-    expected = Cli::WithBinaryBlock(expected, std::vector<std::uint8_t>(1904, 9));
+    Service::SetRawWord(expected, 10200, 7);
+    Service::SetRawWord(expected, 10201, 0xFFFF0000);
+    Service::SetRawWord(expected, 10203, 0xCAFE);
+    expected = Service::WithBinaryBlock(expected, std::vector<std::uint8_t>(1904, 9));
     EXPECT_EQ(ReadFile(image_), expected);
     EXPECT_EQ(folder_.Files(), (std::vector<std::string>{"block", "image"})) << "no backups of files";
     Fail({"word", "get", "--image", image_, "--device", "sim"}, ExitCode::Usage);
@@ -438,11 +438,11 @@ TEST_P(MemoryCommandsTest, ChangesOfAnImageFileNeedNoInstrument) {
 }
 
 TEST_P(MemoryCommandsTest, LogIsShownAndBothCopiesAreEmptied) {
-    Cli::ImageModel model(before_);
+    Service::ImageModel model(before_);
     std::vector<std::int32_t> ramp(128);
     std::iota(ramp.begin(), ramp.end(), 77'000);
-    model.Get().SetProperty(10010, Cli::Property(ramp));
-    model.Get().SetProperty(10002, Cli::Property(std::int32_t{5}));
+    model.Get().SetProperty(10010, Service::Property(ramp));
+    model.Get().SetProperty(10002, Service::Property(std::int32_t{5}));
     model.Get().DumpLog();
     EepromImage used = model.Contents();
     used[2048] ^= 1;  // the second copy is damaged
@@ -476,7 +476,7 @@ TEST_P(MemoryCommandsTest, WordsAndBlockOnAnInstrument) {
 TEST_P(MemoryCommandsTest, DiffNamesValuesAndAreas) {
     WriteFile(image_, before_);
     Succeed({"eeprom", "diff", image_});
-    WriteFile(backup_, Cli::WithCalibration(before_, {{1211, "78"}}).image);
+    WriteFile(backup_, Service::WithCalibration(before_, {{1211, "78"}}).image);
     Fail({"eeprom", "diff", image_, backup_}, ExitCode::Different);
     EXPECT_THAT(tool_.Out(), HasSubstr("calibration  1211  77 -> 78"));
     Fail({"eeprom", "diff", backup_, "--json"}, ExitCode::Different);

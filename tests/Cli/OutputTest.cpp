@@ -13,14 +13,14 @@
 #include <sstream>
 #include <thread>
 
-#include "Failure.h"
 #include "Output/Json.h"
 #include "Output/LiveBlock.h"
 #include "Output/Plot.h"
-#include "Output/Progress.h"
+#include "Output/ProgressLine.h"
 #include "Output/RecordingFile.h"
 #include "Output/Table.h"
 #include "Output/WallTimeText.h"
+#include "Service/Failure.h"
 #include "Support/ExpectThrow.h"
 #include "ToolFixture.h"
 #include "Utilities/Files/AtomicFile.h"
@@ -30,6 +30,7 @@ namespace Varnholt::Tests {
 namespace {
 
 using namespace Cli;
+using Service::Interruption;
 using namespace Varnholt::Utilities::Files;
 
 TEST(TableTest, ColumnsAreAsWideAsTheirWidestCellAndLinesEndWithoutBlanks) {
@@ -138,7 +139,8 @@ TEST(ProgressTest, Lines) {
              Case{16, 32, "pieces", 1, 24, "w  16 of 32 pieces"},
              Case{999'999'999, 1'000'000'000, "B", 10, 19, "w  1.0 GB of 1.0 GB"},
          }) {
-        EXPECT_EQ(Progress::LineFor("w", row.done, row.total, row.unit, row.seconds, row.columns), row.line);
+        EXPECT_EQ(ProgressLine::LineFor("w", row.done, row.total, row.unit, row.seconds, row.columns),
+                  row.line);
     }
 }
 
@@ -146,13 +148,13 @@ TEST(ProgressTest, SilentUnlessOnATerminalAndGoneAtTheEnd) {
     StreamFacts facts;
     facts.isTerminal = true;
     std::ostringstream plain, terminal;
-    { Progress(plain, facts, "w", 2, "pieces").Update(2); }
+    { ProgressLine(plain, facts, "w", 2, "pieces").Update(2); }
     EXPECT_EQ(plain.str(), "") << "cannot be drawn on";
     facts.movesCursor = true;
     int columns = 200;
     facts.size = [&columns] { return TerminalSize{columns, 24}; };
     {
-        Progress progress(terminal, facts, "w", 2, "pieces");
+        ProgressLine progress(terminal, facts, "w", 2, "pieces");
         progress.Update(2);
         columns = 10;
         terminal.str({});
@@ -380,7 +382,7 @@ TEST_F(RecordingFileTest, AnInterruptionEndsEveryWait) {
     {
         Interruption interruption;
         std::thread user([&interruption] { interruption.Request(); });
-        ExpectThrow<ToolFailure>("interrupted", [&] { RecordingFile(fifo, interruption); });
+        ExpectThrow<Failure>("interrupted", [&] { RecordingFile(fifo, interruption); });
         user.join();
     }
     const int idleReader = ::open(fifo.c_str(), O_RDONLY | O_NONBLOCK);
@@ -389,7 +391,7 @@ TEST_F(RecordingFileTest, AnInterruptionEndsEveryWait) {
     RecordingFile file(fifo, interruption);
     std::thread user([&interruption] { interruption.Request(); });
     const std::string records(1'000'000, 'x');
-    ExpectThrow<ToolFailure>("interrupted", [&] { file.Append(records, records.size() / 100); });
+    ExpectThrow<Failure>("interrupted", [&] { file.Append(records, records.size() / 100); });
     user.join();
     EXPECT_EQ(file.Records(), static_cast<std::uint64_t>(::fcntl(idleReader, F_GETPIPE_SZ)) / 100);
     EXPECT_EQ(file.KeepWholeRecords().file, fifo);

@@ -1,7 +1,7 @@
+#include "Output/RecordWriter.h"
 #include "Output/StreamOutput.h"
 #include "Platform/EventScheduler.h"
 #include "Protocol/ByteOrder.h"
-#include "ScanRecorder.h"
 #include "ToolFixture.h"
 
 namespace Varnholt::Tests {
@@ -143,7 +143,7 @@ TEST_P(ScanTest, WhatCameIsKept) {
     struct Case {
         const char* name;
         const char* faults;
-        std::function<void(Cli::Interruption& user)> event;  ///< after 5 s
+        std::function<void(Service::Interruption& user)> event;  ///< after 5 s
         ExitCode code;
         const char* ended;
         const char* text;
@@ -177,7 +177,7 @@ TEST_P(ScanTest, WhatCameIsKept) {
             if (how == "there") {
                 WriteFile(folder_.Path("raw"), {1});
             }
-            Cli::Interruption interruption;
+            Service::Interruption interruption;
             tool_.interruption = &interruption;
             const auto event = After(5'000'000, [&] { row.event ? row.event(interruption) : void(); });
             Arguments arguments{"scan", "--raw", "--json", "--timeout", "2", "--output", folder_.Path("raw")};
@@ -237,7 +237,7 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
     int interrupted = 0;
     for (std::uint64_t after = 0; after < 4'000; after += 100) {
         SCOPED_TRACE(after);
-        Cli::Interruption interruption;
+        Service::Interruption interruption;
         tool_.interruption = &interruption;
         const auto event = After(after * 1000, [&] { interruption.Request(); });
         const Stopwatch watch(clock_);
@@ -284,8 +284,9 @@ TEST(ScanRecorderTest, RecordsArePutTogetherFromTransfers) {
                 std::ostringstream stream;
                 Cli::StreamOutput output(stream);
                 std::uint64_t told = 0;
-                Cli::ScanRecorder recorder({recordSize, isRaw, false, {true, false}}, output,
-                                           [&told](std::uint64_t bytes) { told = bytes; });
+                Cli::RecordWriter writer({recordSize, isRaw, false, {true, false}}, output);
+                Service::ScanRecorder recorder(recordSize, writer,
+                                               [&told](std::uint64_t bytes) { told = bytes; });
                 for (std::size_t i = 0; i < data.size(); i += transfer) {
                     recorder.Receive(std::span(data).subspan(i, std::min(transfer, data.size() - i)));
                 }

@@ -25,9 +25,9 @@ class ToolRunner {
         out_.str({});
         err_.str({});
         log_.str({});
-        Cli::Surroundings surroundings{out_, err_, log_, outFacts, errFacts, inputPatience};
-        Cli::Interruption none;
-        return Cli::RunTool(arguments, surroundings, interruption != nullptr ? *interruption : none);
+        Cli::Streams streams{out_, err_, log_, outFacts, errFacts, inputPatience};
+        Service::Interruption none;
+        return Cli::RunTool(arguments, streams, interruption != nullptr ? *interruption : none);
     }
     /// From now on nothing can be written to standard output.
     void CloseOut() { out_.setstate(std::ios::badbit); }
@@ -47,7 +47,7 @@ class ToolRunner {
 
     Cli::StreamFacts outFacts, errFacts;
     std::uint32_t inputPatience = 30'000;
-    Cli::Interruption* interruption = nullptr;
+    Service::Interruption* interruption = nullptr;
 
   private:
     std::ostringstream out_, err_, log_;

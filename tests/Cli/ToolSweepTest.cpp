@@ -4,9 +4,9 @@
 #include <cstdio>
 #include <map>
 
-#include "Memory/ImageEdit.h"
-#include "Memory/ImageModel.h"
 #include "Protocol/PropertyIdentifiers.h"
+#include "Service/Memory/ImageEdit.h"
+#include "Service/Memory/ImageModel.h"
 #include "ToolFixture.h"
 
 namespace Varnholt::Tests {
@@ -76,9 +76,9 @@ const std::vector<Command>& Commands() {
 
 /// The image that is written: the fresh one with a difference in several pieces.
 Bytes ImageToWrite() {
-    Bytes image = Cli::FreshImage();
-    for (std::uint16_t id = Protocol::PropertyIds::FirstRawWord; id < Cli::LastWritableRawWord; ++id) {
-        Cli::SetRawWord(image, id, 0xA5000000U + id);
+    Bytes image = Service::FreshImage();
+    for (std::uint16_t id = Protocol::PropertyIds::FirstRawWord; id < Service::LastWritableRawWord; ++id) {
+        Service::SetRawWord(image, id, 0xA5000000U + id);
     }
     image.back() ^= 0x55;
     return image;
@@ -113,7 +113,7 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
         auto& instrument = host.Add("sim", settings);
         const TestFolder folder;
         WriteFile(folder.Path("image"), ImageToWrite());
-        WriteFile(folder.Path("block"), Bytes(Cli::BinaryBlockOf(ImageToWrite()).size(), 0x3C));
+        WriteFile(folder.Path("block"), Bytes(Service::BinaryBlockOf(ImageToWrite()).size(), 0x3C));
         const auto script = host.Bus().SetFaults("sim", plan);
         Arguments arguments;
         for (const std::string& argument : command_.arguments) {

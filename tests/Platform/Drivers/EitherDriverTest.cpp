@@ -1,6 +1,6 @@
 // What the instrument's own driver and the USBIO driver have in common, each with its own controls and codes.
 #include "Platform/Drivers/DriverFixture.h"
-#include "Platform/InterruptibleDeviceFiles.h"
+#include "Service/InterruptibleDeviceFiles.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -123,7 +123,7 @@ TEST_P(EitherDriver, AnInterruptionEndsAllTransfersAndLetsNoneStart) {
     device_->LeaveToTest(BulkInEndpoint);
     device_->LeaveToTest(InterruptInEndpoint);
     const auto drivers = std::move(files_);
-    auto interruptible = std::make_unique<Platform::InterruptibleDeviceFiles>(*drivers);
+    auto interruptible = std::make_unique<Service::InterruptibleDeviceFiles>(*drivers);
     auto& inFront = *interruptible;
     files_ = std::move(interruptible);
     const Handle opened[] = {OpenMain(), OpenEndpoint(BulkInEndpoint), OpenEndpoint(InterruptInEndpoint)};

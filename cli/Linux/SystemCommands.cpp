@@ -1,0 +1,89 @@
+#include "SystemCommands.h"
+
+#include <optional>
+
+#include "Commands/Commands.h"
+#include "ExitCode.h"
+#include "Output/Json.h"
+#include "Output/Table.h"
+#include "Platform/DeviceFiles.h"
+#include "Platform/Drivers/DriverFileSystem.h"
+#include "Platform/Usb/PcapngWriter.h"
+#include "Platform/Usb/SystemUsbBus.h"
+#include "Platform/Usb/UdevBus.h"
+#include "Platform/Usb/UsbCapture.h"
+#include "Session.h"
+
+namespace Varnholt::Cli {
+namespace {
+
+/// The system's bus, whose devices are recorded once the recording has begun.
+class BusRecording final : public TrafficRecording, private Platform::Usb::UsbBus {
+  public:
+    explicit BusRecording(const std::string& file) : name_(file) {}
+
+    void Begin() override {
+        if (writer_) {
+            return;
+        }
+        writer_.emplace(name_, "ostra " OSTRA_VERSION);
+        Check();
+        recorded_.emplace(bus_, *writer_);
+    }
+    void Check() const override {
+        if (writer_ && writer_->Failed()) {
+            throw Failure(FailureKind::File, name_ + " cannot be written");
+        }
+    }
+
+  private:
+    std::vector<std::string> List() override { return bus_.List(); }
+    std::shared_ptr<Platform::Usb::UsbDevice> Open(const std::string& device,
+                                                   Platform::ErrorCode& error) override {
+        return recorded_ ? recorded_->Open(device, error) : bus_.Open(device, error);
+    }
+
+    const std::string name_;
+    Platform::Usb::UsbBus& bus_ = Platform::Usb::SystemUsbBus();
+    std::optional<Platform::Usb::PcapngWriter> writer_;
+    std::optional<Platform::Usb::CapturingBus> recorded_;
+    const std::unique_ptr<Platform::DeviceFileSystem> files_ = Platform::Drivers::MakeDriverFileSystem(*this);
+    const Platform::ScopedDeviceFiles filesInForce_{*files_};
+};
+
+}  // namespace
+
+std::unique_ptr<TrafficRecording> RecordTraffic(const std::string& file) {
+    return std::make_unique<BusRecording>(file);
+}
+
+void AddSystemCommands(CommandSpec app, Session& session) {
+    AddRegister(app, session);
+    AddDoctor(app, session);
+}
+
+void PrintCandidates(Session& session, bool json) {
+    Json list = Json::array();
+    Table table({{"NAME"}, {"VID:PID"}, {"REGISTERED"}, {"DEVICE"}});
+    for (const auto& device : Platform::Usb::ListCandidateDevices()) {
+        const std::string id = device.vendorId + ":" + device.productId;
+        const std::string text =
+            device.manufacturer + (device.manufacturer.empty() ? "" : " ") + device.product;
+        list.push_back({{"name", device.name},
+                        {"id", id},
+                        {"registered", device.registered},
+                        {"device", text},
+                        {"serial", device.serial},
+                        {"node", device.deviceNode}});
+        table.AddRow({device.name, id, device.registered ? "yes" : "no", text});
+    }
+    if (json) {
+        session.Print({{"candidates", list}});
+    } else if (table.IsEmpty()) {
+        session.Note("no USB device with the instrument's endpoints is plugged in");
+    } else {
+        table.Print(session.Out());
+    }
+}
+
+}  // namespace Varnholt::Cli

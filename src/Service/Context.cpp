@@ -1,0 +1,72 @@
+#include "Service/Context.h"
+
+#include "Service/Instruments.h"
+#include "Utilities/Files/FileError.h"
+
+namespace Varnholt::Service {
+namespace {
+
+class Untold final : public Progress {
+  public:
+    void Update(std::uint64_t) override {}
+};
+
+/// What this layer has found itself says already which instrument or file it is about.
+bool IsOwn(const std::exception_ptr& exception) {
+    try {
+        std::rethrow_exception(exception);
+    } catch (const Failure&) {
+        return true;
+    } catch (const Utilities::Files::FileError&) {
+        return true;
+    } catch (...) {
+        return false;
+    }
+}
+
+}  // namespace
+
+Context::Context(Observer& toldObserver, Interruption& userInterruption)
+    : observer_(toldObserver),
+      interruption_(userInterruption),
+      files_(Platform::DeviceFiles()),
+      filesInForce_(files_) {
+    interruption_.SetAction([this] { files_.Interrupt(); });
+}
+
+Context::~Context() {
+    interruption_.SetAction({});
+}
+
+std::unique_ptr<Progress> Context::StartProgress(const std::string& title, std::uint64_t total,
+                                                 const std::string& unit) const {
+    auto progress = observer_.StartProgress(title, total, unit);
+    return progress != nullptr ? std::move(progress) : std::make_unique<Untold>();
+}
+
+void Context::Sleep(std::uint32_t milliseconds) const {
+    if (!interruption_.Sleep(milliseconds)) {
+        interruption_.ThrowIfRequested();
+    }
+}
+
+Failure Context::Explain(const std::exception_ptr& exception, const std::string& identifier) const {
+    const Failure failure = Describe(exception);
+    if (IsOwn(exception)) {
+        return failure;
+    }
+    if (interruption_.IsRequested()) {
+        return {FailureKind::Interrupted, "interrupted"};
+    }
+    if (identifier.empty()) {
+        return failure;
+    }
+    if (failure.IsOfTransfer() && !IsConnected(*this, identifier)) {
+        return Failure(FailureKind::Unplugged, "unplugged (" + failure.Message() + ")",
+                       "plug it in again; `ostra list` shows whether it is found", failure.DriverText())
+            .Of(identifier);
+    }
+    return failure.Of(identifier);
+}
+
+}  // namespace Varnholt::Service

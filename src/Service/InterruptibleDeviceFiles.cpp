@@ -1,0 +1,207 @@
+#include "Service/InterruptibleDeviceFiles.h"
+
+#include <algorithm>
+#include <new>
+
+#include "Protocol/ByteOrder.h"
+#include "Protocol/Instrument.h"
+#include "Protocol/NativeDriver.h"
+#include "Protocol/UsbIoDriver.h"
+
+namespace Varnholt::Service {
+
+using namespace Platform;
+
+namespace {
+
+constexpr std::uint32_t AbortLimit = 2000;  // milliseconds
+
+/// The pipe below a device of the instrument's own driver, 0 for any other file.
+std::uint32_t NativePipeOf(const std::string& path) {
+    const std::string suffix = Protocol::NativeDriver::PipeSuffix;
+    const bool isPipe = path.size() > suffix.size() + 1 &&
+                        path.compare(path.size() - 1 - suffix.size(), suffix.size(), suffix) == 0;
+    const char last = path.empty() ? '0' : path.back();
+    return isPipe && last >= '1' && last <= '3' ? static_cast<std::uint32_t>(last - '0') : 0;
+}
+
+std::uint8_t EndpointOfNativePipe(std::uint32_t pipe) {
+    switch (pipe) {
+        case Protocol::NativeDriver::ReadPipe:
+            return Protocol::BulkInEndpoint;
+        case Protocol::NativeDriver::WritePipe:
+            return Protocol::BulkOutEndpoint;
+        default:
+            return Protocol::InterruptInEndpoint;
+    }
+}
+
+}  // namespace
+
+InterruptibleDeviceFiles::InterruptibleDeviceFiles(DeviceFileSystem& underlying) : below_(underlying) {}
+
+void InterruptibleDeviceFiles::Interrupt() {
+    const CriticalSection::Holder holder(section_);
+    interrupted_ = true;
+    std::vector<Handle> busy;
+    for (const RunningTransfer& transfer : running_) {
+        if (std::find(busy.begin(), busy.end(), transfer.file) == busy.end()) {
+            busy.push_back(transfer.file);
+        }
+    }
+    for (const Handle file : busy) {
+        AbortPipe(file);
+    }
+}
+
+void InterruptibleDeviceFiles::Resume() {
+    interrupted_ = false;
+}
+
+const std::string& InterruptibleDeviceFiles::PathOf(Handle file) const {
+    static const std::string none;
+    const auto found = std::find_if(files_.begin(), files_.end(),
+                                    [file](const OpenedFile& opened) { return opened.handle == file; });
+    return found == files_.end() ? none : found->path;
+}
+
+void InterruptibleDeviceFiles::AbortPipe(Handle file) {
+    const std::string& path = PathOf(file);
+    const std::uint32_t pipe = NativePipeOf(path);
+    if (pipe == 0) {
+        Control(file, Protocol::UsbIoDriver::Control::AbortPipe, nullptr, 0);
+        return;
+    }
+    const std::string device =
+        path.substr(0, path.size() - 1 - std::string(Protocol::NativeDriver::PipeSuffix).size());
+    const auto owner = std::find_if(files_.begin(), files_.end(),
+                                    [&device](const OpenedFile& opened) { return opened.path == device; });
+    if (owner == files_.end()) {
+        return;
+    }
+    Protocol::NativeDriver::ControlBlock block{};
+    Protocol::StoreLittle16(&block[Protocol::NativeDriver::Block::Value], EndpointOfNativePipe(pipe));
+    Control(owner->handle, Protocol::NativeDriver::ControlAbortPipe, block.data(),
+            static_cast<std::uint32_t>(block.size()));
+}
+
+/// Failures do not matter: whoever waits for the transfers still has limits of his own.
+void InterruptibleDeviceFiles::Control(Handle file, std::uint32_t code, const void* input,
+                                       std::uint32_t inputSize) {
+    const OwnedHandle event(MakeAutoResetEvent());
+    if (!event) {
+        return;
+    }
+    Overlapped record;
+    record.event = event.Get();
+    if (below_.StartControl(file, code, input, inputSize, nullptr, 0, record) ||
+        LastError() != Errors::IoPending) {
+        return;
+    }
+    Wait(event.Get(), AbortLimit);
+    std::uint32_t transferred = 0;
+    if (!below_.GetResult(file, record, transferred, false) && LastError() == Errors::IoIncomplete) {
+        below_.CancelTransfers(file);
+        below_.GetResult(file, record, transferred, true);
+    }
+}
+
+std::vector<std::string> InterruptibleDeviceFiles::ListInterfaces(const Protocol::Guid& interfaceClass) {
+    return below_.ListInterfaces(interfaceClass);
+}
+
+Handle InterruptibleDeviceFiles::Open(const std::string& path) {
+    const Handle file = below_.Open(path);
+    if (file == InvalidHandle()) {
+        return file;
+    }
+    try {
+        const CriticalSection::Holder holder(section_);
+        files_.push_back({file, path});
+        return file;
+    } catch (const std::bad_alloc&) {
+        below_.CloseFile(file);
+        SetLastError(Errors::NotEnoughMemory);
+        return InvalidHandle();
+    }
+}
+
+bool InterruptibleDeviceFiles::CloseFile(Handle file) {
+    {
+        const CriticalSection::Holder holder(section_);
+        std::erase_if(files_, [file](const OpenedFile& opened) { return opened.handle == file; });
+        std::erase_if(running_, [file](const RunningTransfer& transfer) { return transfer.file == file; });
+    }
+    return below_.CloseFile(file);
+}
+
+bool InterruptibleDeviceFiles::Refuse(Overlapped& record, ErrorCode code) {
+    record.internal = 0;
+    record.internalHigh = 0;
+    if (record.event != NoHandle) {
+        SignalEvent(record.event);
+    }
+    SetLastError(code);
+    return false;
+}
+
+/// The section is held over the start, so that no transfer slips in behind an interruption.
+template <class Start>
+bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, Start start) try {
+    const CriticalSection::Holder holder(section_);
+    if (interrupted_) {
+        return Refuse(record, Errors::OperationAborted);
+    }
+    std::erase_if(running_,
+                  [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
+    running_.push_back({&record, file});
+    const bool completed = start();
+    if (!completed && LastError() != Errors::IoPending) {
+        const ErrorCode code = LastError();
+        running_.pop_back();
+        SetLastError(code);
+    }
+    return completed;
+} catch (const std::bad_alloc&) {
+    return Refuse(record, Errors::NotEnoughMemory);
+}
+
+bool InterruptibleDeviceFiles::StartRead(Handle file, void* buffer, std::uint32_t length,
+                                         Overlapped& record) {
+    return StartTransfer(file, record, [&] { return below_.StartRead(file, buffer, length, record); });
+}
+
+bool InterruptibleDeviceFiles::StartWrite(Handle file, const void* buffer, std::uint32_t length,
+                                          Overlapped& record) {
+    return StartTransfer(file, record, [&] { return below_.StartWrite(file, buffer, length, record); });
+}
+
+bool InterruptibleDeviceFiles::StartControl(Handle file, std::uint32_t code, const void* input,
+                                            std::uint32_t inputSize, void* output, std::uint32_t outputSize,
+                                            Overlapped& record) {
+    // A control is short and has no pipe that could be aborted; it ends by itself.
+    return interrupted_ ? Refuse(record, Errors::OperationAborted)
+                        : below_.StartControl(file, code, input, inputSize, output, outputSize, record);
+}
+
+bool InterruptibleDeviceFiles::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred,
+                                         bool wait) {
+    const bool succeeded = below_.GetResult(file, record, transferred, wait);
+    const ErrorCode code = LastError();
+    if (!succeeded && code == Errors::IoIncomplete) {
+        return false;
+    }
+    {
+        const CriticalSection::Holder holder(section_);
+        std::erase_if(running_,
+                      [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
+    }
+    SetLastError(code);
+    return succeeded;
+}
+
+bool InterruptibleDeviceFiles::CancelTransfers(Handle file) {
+    return below_.CancelTransfers(file);
+}
+
+}  // namespace Varnholt::Service

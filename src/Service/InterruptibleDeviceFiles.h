@@ -1,0 +1,74 @@
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "Platform/DeviceFiles.h"
+#include "Platform/WaitableObjects.h"
+
+namespace Varnholt::Service {
+
+/// Device files that another thread can interrupt: what lets a program end a scan, which otherwise returns
+/// only when the instrument says so. Put in force with `Platform::ScopedDeviceFiles`; everything passes
+/// through to `below`.
+///
+/// An interruption asks the driver to abort the pipes on which transfers run, in the driver's own way: the
+/// USBIO driver through the pipe's file, the instrument's own driver through the device's. What waits for the
+/// transfers sees them fail and unwinds as after any other failure. The files stay open.
+class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
+  public:
+    using Handle = Platform::Handle;
+    using Overlapped = Platform::Overlapped;
+
+    /// `underlying` must outlive the object.
+    explicit InterruptibleDeviceFiles(Platform::DeviceFileSystem& underlying);
+    InterruptibleDeviceFiles(const InterruptibleDeviceFiles&) = delete;
+    InterruptibleDeviceFiles& operator=(const InterruptibleDeviceFiles&) = delete;
+
+    /// Ends the reads and writes that run, and refuses new transfers and controls with
+    /// `Platform::Errors::OperationAborted` until `Resume`. The event of what is refused is signalled: the
+    /// instrument's own driver has callers that wait for it although nothing was started. Returns within 2 s
+    /// for each pipe. Any thread.
+    void Interrupt();
+    /// Transfers may start again.
+    void Resume();
+    bool IsInterrupted() const { return interrupted_.load(); }
+
+    std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
+    Handle Open(const std::string& path) override;
+    bool CloseFile(Handle file) override;
+    bool StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) override;
+    bool StartWrite(Handle file, const void* buffer, std::uint32_t length, Overlapped& record) override;
+    bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
+                      void* output, std::uint32_t outputSize, Overlapped& record) override;
+    bool GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) override;
+    bool CancelTransfers(Handle file) override;
+
+  private:
+    struct OpenedFile {
+        Handle handle;
+        std::string path;
+    };
+    struct RunningTransfer {
+        const Overlapped* record;
+        Handle file;
+    };
+
+    template <class Start>
+    bool StartTransfer(Handle file, Overlapped& record, Start start);
+    static bool Refuse(Overlapped& record, Platform::ErrorCode code);
+    void AbortPipe(Handle file);
+    void Control(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize);
+    const std::string& PathOf(Handle file) const;
+
+    Platform::DeviceFileSystem& below_;
+    std::atomic<bool> interrupted_{false};
+    /// Guards what follows, and keeps files from being closed while their pipes are aborted.
+    Platform::CriticalSection section_;
+    std::vector<OpenedFile> files_;
+    std::vector<RunningTransfer> running_;
+};
+
+}  // namespace Varnholt::Service

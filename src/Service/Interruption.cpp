@@ -1,0 +1,38 @@
+#include "Service/Interruption.h"
+
+#include <utility>
+
+#include "Service/Failure.h"
+
+namespace Varnholt::Service {
+
+Interruption::Interruption() : event_(Platform::MakeAutoResetEvent()) {}
+
+void Interruption::Request() {
+    requested_ = true;
+    Platform::SignalEvent(event_.Get());
+    const Platform::CriticalSection::Holder holder(section_);
+    if (action_ && deferrals_ == 0) {
+        action_();
+    }
+}
+
+bool Interruption::Sleep(std::uint32_t milliseconds) const {
+    if (!requested_ && milliseconds > 0) {
+        Platform::Wait(event_.Get(), milliseconds);
+    }
+    return !requested_;
+}
+
+void Interruption::ThrowIfRequested() const {
+    if (requested_) {
+        throw Failure(FailureKind::Interrupted, "interrupted");
+    }
+}
+
+void Interruption::SetAction(std::function<void()> whenRequested) {
+    const Platform::CriticalSection::Holder holder(section_);
+    action_ = std::move(whenRequested);
+}
+
+}  // namespace Varnholt::Service

@@ -1,0 +1,30 @@
+#include "Service/Holder.h"
+
+#include <fmt/format.h>
+
+#include "Platform/Usb/SimulatorBus.h"
+#include "Platform/Usb/UdevBus.h"
+#include "Service/Instruments.h"
+#include "Service/Linux/DeviceHolders.h"
+
+namespace Varnholt::Service {
+
+std::string HolderOf(const std::string& identifier) {
+    const std::string name = ShortNameOf(identifier);
+    for (const auto& device : Platform::Usb::ListRegisteredDevices()) {
+        if (device.name != name) {
+            continue;
+        }
+        for (const auto& holder : FindHolders(device.deviceNode)) {
+            return fmt::format("{} (process {})", holder.name, holder.processId);
+        }
+    }
+    for (const auto& simulator : Platform::Usb::ListSimulators()) {
+        if (simulator.name == name) {
+            return simulator.usedBy;
+        }
+    }
+    return {};
+}
+
+}  // namespace Varnholt::Service

@@ -1,0 +1,57 @@
+#include "Service/SystemAdvice.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <iterator>
+
+#include "Platform/Posix/UserDirectory.h"
+
+namespace Varnholt::Service {
+namespace {
+
+namespace Errors = Platform::Errors;
+
+struct Reason {
+    Platform::ErrorCode code;
+    const char* text;
+    const char* fix;
+};
+
+constexpr const char* Mount =
+    "sudo mkdir -p /dev/shm && sudo mount -t tmpfs -o mode=1777 tmpfs /dev/shm; in a container, whoever "
+    "starts it";
+
+constexpr Reason Reasons[] = {
+    {Errors::FileNotFound, "it does not exist", Mount},
+    {Errors::PathNotFound, "it is no directory", Mount},
+    {Errors::NotSupported, "its file system makes no unnamed files", Mount},
+    {Errors::AccessDenied, "it may not be written",
+     "sudo chmod 1777 /dev/shm, or where it is mounted read-only: sudo mount -o remount,rw /dev/shm"},
+    {Errors::NoSystemResources, "it is full, or this process has too many open files",
+     "delete what is not needed there (`df -h /dev/shm`, `df -i /dev/shm`), or raise `ulimit -n`"},
+    {Errors::NotEnoughMemory, "not enough memory", "end programs that need much of it"},
+    {Errors::InvalidData, "a program with another version of the library uses it", "end that program"},
+    {Errors::Busy, "another program keeps its file locked", "end that program"},
+};
+
+}  // namespace
+
+namespace SystemAdvice {
+const char* const NoneIsFound =
+    "`ostra doctor` looks for the reason; `ostra-simulator` simulates an instrument";
+const char* const NoPermission = "`ostra doctor` names the reason and the fix";
+const char* const TransferFailed = "try again; if it stays, `ostra doctor`";
+}  // namespace SystemAdvice
+
+Failure DescribeMissingLock(Platform::ErrorCode code) {
+    const auto* const known = std::ranges::find(Reasons, code, &Reason::code);
+    const bool isKnown = known != std::end(Reasons);
+    return {FailureKind::NoLock,
+            fmt::format("the lock that instruments need cannot be had in {}: {}",
+                        Platform::Posix::UserDirectory::SharedMemory,
+                        isKnown ? known->text : Platform::ErrorText(code)),
+            isKnown ? known->fix : Mount};
+}
+
+}  // namespace Varnholt::Service

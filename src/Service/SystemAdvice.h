@@ -1,0 +1,18 @@
+#pragma once
+
+#include "Platform/ErrorCodes.h"
+#include "Service/Failure.h"
+
+/// What the user can do next with this system's means.
+namespace Varnholt::Service {
+
+namespace SystemAdvice {
+extern const char* const NoneIsFound;
+extern const char* const NoPermission;
+extern const char* const TransferFailed;
+}  // namespace SystemAdvice
+
+/// Why the system refuses the lock of an instrument, and what to do: `code` is what `MakeMutex` left.
+Failure DescribeMissingLock(Platform::ErrorCode code);
+
+}  // namespace Varnholt::Service

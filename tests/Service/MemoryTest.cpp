@@ -1,0 +1,370 @@
+#include <gtest/gtest.h>
+
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "Protocol/ByteOrder.h"
+#include "Protocol/EepromMap.h"
+#include "Service/Failure.h"
+#include "Service/Memory/EepromAccess.h"
+#include "Service/Memory/ImageCheck.h"
+#include "Service/Memory/ImageDiff.h"
+#include "Service/Memory/ImageEdit.h"
+#include "Service/Memory/ImageModel.h"
+#include "Service/Memory/ImageTransport.h"
+#include "Service/Memory/PropertyText.h"
+
+namespace Varnholt::Tests {
+namespace {
+
+using namespace Service;
+namespace Map = Protocol::EepromMap;
+using Severity = ImageFinding::Severity;
+
+/// A fresh image with something in every area.
+EepromImage UsedImage() {
+    EepromImage image = FreshImage();
+    image = WithCalibration(image, {{1211, "77"}, {1000, "0.5,-2"}}).image;
+    for (std::uint32_t i = 0; i < Map::BinaryFirstSize; ++i) {
+        image[Map::BinaryFirst + i] = static_cast<std::uint8_t>(i * 3);
+    }
+    for (std::uint32_t i = 0; i < Map::BinarySecondSize; ++i) {
+        image[Map::BinarySecond + i] = static_cast<std::uint8_t>(i * 5 + 1);
+    }
+    SetRawWord(image, 10203, 0x01020304);
+    image[8000] = 0x42;
+    return image;
+}
+
+/// Addresses at which two images differ.
+std::vector<std::uint32_t> Differences(const EepromImage& a, const EepromImage& b) {
+    std::vector<std::uint32_t> addresses;
+    for (std::uint32_t at = 0; at < a.size(); ++at) {
+        if (a[at] != b[at]) {
+            addresses.push_back(at);
+        }
+    }
+    return addresses;
+}
+
+template <class Function>
+std::string FailureOf(Function function, FailureKind kind = FailureKind::BadArgument) {
+    try {
+        function();
+    } catch (const Failure& failure) {
+        EXPECT_EQ(failure.Kind(), kind) << failure.what();
+        return failure.what();
+    }
+    ADD_FAILURE() << "no failure";
+    return {};
+}
+
+TEST(ImageTransportTest, ReachesNothingOutsideTheImage) {
+    EepromImage image(8192, 7);
+    ImageTransport transport(image);
+    using DeviceDriver::Generic::Utilities::IOException;
+    using Part = std::pair<std::uint32_t, std::uint32_t>;
+    std::vector<std::uint8_t> buffer(9000);
+    DeviceDriver::Ostra::LowLevel::Bytes4 address;
+    for (const auto& [start, count] : {Part{0, 8192}, Part{8191, 1}, Part{8192, 0}}) {
+        Protocol::StoreBig32(address.data(), start);
+        EXPECT_NO_THROW(transport.ReadEEPROM(address, {}, buffer.data(), count));
+        EXPECT_NO_THROW(transport.WriteEEPROM(address, {}, buffer.data(), count));
+    }
+    for (const auto& [start, count] : {Part{8191, 2}, Part{8193, 0}, Part{0xFFFFFFFF, 2}, Part{0, 8193}}) {
+        Protocol::StoreBig32(address.data(), start);
+        EXPECT_THROW(transport.ReadEEPROM(address, {}, buffer.data(), count), IOException) << start;
+        EXPECT_THROW(transport.WriteEEPROM(address, {}, buffer.data(), count), IOException) << start;
+    }
+}
+
+TEST(PropertyTextTest, AssignmentsKeepTypeAndNumberOfElements) {
+    const Property oneLong(std::int32_t{0});
+    const Property twoFloats(std::vector<float>{0, 0});
+    struct Case {
+        const char* text;
+        const Property& pattern;
+        const char* result;
+    };
+    for (const Case& row : {
+             Case{"1=5", oneLong, "5"},
+             Case{"1=-2147483648", oneLong, "-2147483648"},
+             Case{"1=2147483647", oneLong, "2147483647"},
+             Case{"1=0xFFFFFFFF", oneLong, "-1"},
+             Case{"0x3E8=0x10", oneLong, "16"},
+             Case{"65535=0.1, -1e-3", twoFloats, "0.1, -0.001"},
+             Case{"1= 3 ,4 ", twoFloats, "3, 4"},
+             Case{"1=010", oneLong, "10"},
+         }) {
+        EXPECT_EQ(TextOf(ParseValue(ParseAssignment(row.text), row.pattern)), row.result) << row.text;
+    }
+    for (const char* text : {"", "1", "=5", "1=", "x=5", "65536=5", "-1=5", "1 =5"}) {
+        FailureOf([text] { ParseAssignment(text); });
+    }
+    for (const char* text : {"1=5,6", "1=2147483648", "1=-2147483649", "1=5x", "1=1.5", "1=0x", "1=--5",
+                             "1=0x100000000", "1= ", "1=1 5"}) {
+        FailureOf([&] { ParseValue(ParseAssignment(text), oneLong); });
+    }
+    for (const char* text : {"1=5", "1=1,2,3", "1=nan,1", "1=1,inf", "1=1e39,0", "1=1;2", "1=,"}) {
+        FailureOf([&] { ParseValue(ParseAssignment(text), twoFloats); });
+    }
+}
+
+TEST(ImageEditTest, CalibrationLeavesADamagedLogAlone) {
+    EepromImage before = UsedImage();
+    before[9] ^= 1;  // main copy
+    EXPECT_EQ(Differences(before, WithCalibration(before, {{1211, "78"}}).image),
+              std::vector<std::uint32_t>{4711});
+    before[2048 + 9] ^= 2;  // and the other
+    EXPECT_EQ(Differences(before, WithCalibration(before, {{1211, "78"}}).image),
+              std::vector<std::uint32_t>{4711});
+}
+
+TEST(ImageEditTest, RefusesWhatItCannotProve) {
+    const EepromImage image = UsedImage();
+    FailureOf([&] { WithCalibration(image, {{10002, "5"}}); });
+    FailureOf([&] { WithCalibration(image, {{1206, "5"}}); });
+    FailureOf([&] { WithCalibration(image, {{1000, "5"}}); });
+    // The table says that the calibration lies elsewhere than the driver writes it.
+    EepromImage moved = image;
+    for (std::uint32_t at = Map::Table + 4; at + 6 <= Map::Table + 334; at += 6) {
+        const std::uint32_t address = Protocol::LoadBig32(&moved[at + 2]);
+        if (address >= Map::Calibration) {
+            Protocol::StoreBig32(&moved[at + 2], address + 1000);
+        }
+    }
+    std::copy_n(image.begin() + Map::Calibration, Map::CalibrationSize,
+                moved.begin() + Map::Calibration + 1000);
+    ASSERT_EQ(ImageModel(moved).Get().GetProperty(1211).AsLong(), 77);
+    FailureOf([&] { WithCalibration(moved, {{1211, "5"}}); }, FailureKind::BadData);
+    // The same of the log, which is empty here and there, so that nobody would notice.
+    for (const std::uint32_t copy : {0U, 2048U}) {
+        EepromImage elsewhere = image;
+        for (std::uint32_t at = Map::Table + 4; at + 6 <= Map::Table + 334; at += 6) {
+            const std::uint32_t address = Protocol::LoadBig32(&elsewhere[at + 2]);
+            if (address >= copy && address < copy + 2048) {
+                Protocol::StoreBig32(&elsewhere[at + 2], address + 5000 - copy);
+            }
+        }
+        std::fill_n(elsewhere.begin() + 5000, 1064, 0);
+        FailureOf([&] { WithEmptyLog(elsewhere); }, FailureKind::BadData);
+    }
+    EepromImage corrupt = image;
+    corrupt[Map::Table + 1] = 2;
+    EXPECT_THROW(WithCalibration(corrupt, {{1211, "5"}}), DeviceDriver::Generic::Utilities::DataException);
+    EXPECT_THROW(WithEmptyLog(corrupt), DeviceDriver::Generic::Utilities::DataException);
+}
+
+TEST(ImageEditTest, BinaryBlockLiesInTwoPlaces) {
+    const EepromImage before = UsedImage();
+    std::vector<std::uint8_t> block(Map::BinarySize);
+    for (std::size_t i = 0; i < block.size(); ++i) {
+        block[i] = static_cast<std::uint8_t>(i % 251);
+    }
+    const EepromImage after = WithBinaryBlock(before, block);
+    EXPECT_EQ(BinaryBlockOf(after), block);
+    EXPECT_EQ(ImageModel(after).Get().LoadBinary(10100), block) << "as the driver sees it";
+    for (const std::uint32_t at : Differences(before, after)) {
+        EXPECT_TRUE((at >= 1064 && at < 2048) || (at >= 3112 && at < 4032)) << at;
+    }
+    for (const std::size_t size : {0u, 1903u, 1905u}) {
+        FailureOf([&] { WithBinaryBlock(before, std::vector<std::uint8_t>(size)); }, FailureKind::BadData);
+    }
+}
+
+std::string ErrorsOf(const EepromImage& image) {
+    std::string errors;
+    for (const ImageFinding& finding : CheckImage(image)) {
+        if (finding.severity == Severity::Error) {
+            errors += finding.area + ": " + finding.text + "\n";
+        }
+    }
+    return errors;
+}
+
+std::string Lines(const std::vector<ImageFinding>& findings) {
+    std::string text;
+    for (const ImageFinding& finding : findings) {
+        text += std::string(NameOf(finding.severity)) + " " + finding.area + ": " + finding.text + "\n";
+    }
+    return text;
+}
+
+TEST(ImageCheckTest, AFreshImage) {
+    EXPECT_EQ(Lines(CheckImage(FreshImage())),
+              "ok table: version 1, 334 bytes\n"
+              "ok table: 55 entries\n"
+              "ok log: main copy: checksum 0x00000000\n"
+              "ok log: second copy: checksum 0x00000000\n"
+              "ok log: the driver uses the main copy\n"
+              "ok calibration: 28 values\n"
+              "note calibration: 28 values are -1, as in a fresh instrument\n"
+              "ok binary block: empty\n"
+              "ok raw words: empty\n");
+    EXPECT_EQ(ErrorsOf(UsedImage()), "");
+}
+
+void SetEntry(EepromImage& image, std::uint32_t index, std::uint16_t id, std::uint32_t address) {
+    Protocol::StoreBig16(&image[Map::Table + 4 + 6 * index], id);
+    Protocol::StoreBig32(&image[Map::Table + 6 + 6 * index], address);
+}
+
+TEST(ImageCheckTest, FindsWhatIsWrong) {
+    struct Case {
+        const char* name;
+        void (*damage)(EepromImage& image);
+        const char* finding;
+        bool isSane;
+    };
+    for (const Case& row : {
+             Case{"erased", [](EepromImage& image) { image.assign(8192, 0xFF); },
+                  "error table: version 65535 instead of 1", false},
+             Case{"length", [](EepromImage& image) { Protocol::StoreBig16(&image[4098], 299); },
+                  "error table: length 299 instead of 300 to 512", false},
+             Case{"length between entries",
+                  [](EepromImage& image) { Protocol::StoreBig16(&image[4098], 333); },
+                  "warning table: the length does not end with an entry", true},
+             Case{"main log", [](EepromImage& image) { image[11] ^= 1; },
+                  "warning log: main copy: checksum 0x00000000 instead of 0x00000001", true},
+             Case{"used log", [](EepromImage& image) { image[11] ^= 1; },
+                  "ok log: the driver uses the second copy", true},
+             Case{"both logs",
+                  [](EepromImage& image) {
+                      image[11] ^= 1;
+                      image[2048 + 11] ^= 1;
+                  },
+                  "error log: the driver uses an empty log", false},
+             Case{"other log",
+                  [](EepromImage& image) {
+                      image[2048 + 3] = 1;
+                      image[2048 + 11] = 1;
+                  },
+                  "note log: the two copies hold different values", true},
+             Case{"address beyond the end", [](EepromImage& image) { SetEntry(image, 26, 1000, 9000); },
+                  "error table: values that end outside the image: 1000", false},
+             Case{"negative address", [](EepromImage& image) { SetEntry(image, 0, 10000, 0x80000000); },
+                  "error table: values that end outside the image: 10000", false},
+             Case{"overlap", [](EepromImage& image) { SetEntry(image, 13, 11000, 100); },
+                  "error table: 10010 and 11000 overlap", false},
+             Case{"over the table", [](EepromImage& image) { SetEntry(image, 54, 2, 4608); }, "error table",
+                  false},
+             Case{"unknown entry", [](EepromImage& image) { SetEntry(image, 27, 1999, 4616); },
+                  "warning table: unknown identifiers: 1999", true},
+             Case{"missing value", [](EepromImage& image) { SetEntry(image, 27, 1999, 4616); },
+                  "warning table: the calibration lacks 1001", true},
+             Case{"no checksum", [](EepromImage& image) { SetEntry(image, 0, 1999, 0); },
+                  "error table: the driver refuses the image: id 10000 doesn't exist", false},
+             Case{"log elsewhere", [](EepromImage& image) { SetEntry(image, 11, 10021, 1061); },
+                  "error log: the table has it elsewhere than the driver writes it", false},
+             Case{"second log elsewhere", [](EepromImage& image) { SetEntry(image, 25, 3, 3116); },
+                  "warning log: the table has the second copy elsewhere than the driver writes it", true},
+             Case{"longer log",
+                  [](EepromImage& image) {
+                      SetEntry(image, 12, 1, 1068);
+                      std::fill_n(image.begin() + 1064, 4, std::uint8_t{0});
+                  },
+                  "warning log: it reaches into the binary block", true},
+             Case{"gap in the calibration", [](EepromImage& image) { SetEntry(image, 29, 1206, 4632); },
+                  "warning table: calibration values cannot be changed", true},
+             Case{"repeated", [](EepromImage& image) { SetEntry(image, 28, 1001, 4616); },
+                  "warning table: 1 entries repeat an identifier", true},
+             Case{"no number", [](EepromImage& image) { std::fill_n(image.begin() + 4608, 4, 0xFF); },
+                  "warning calibration: values that are no numbers: 1000", true},
+             Case{"binary block", [](EepromImage& image) { image[1064] = image[4031] = 0; },
+                  "ok binary block: 2 of 1904 bytes used", true},
+             Case{"words", [](EepromImage& image) { image[4032] = image[4035] = image[4095] = 0; },
+                  "ok raw words: 2 of 16 used", true},
+             Case{"rest", [](EepromImage& image) { image[4756] = image[8191] = 0; },
+                  "note rest: 2 bytes behind the calibration data are used", true},
+         }) {
+        EepromImage image = FreshImage();
+        row.damage(image);
+        const std::vector<ImageFinding> findings = CheckImage(image);
+        const std::string text = Lines(findings);
+        EXPECT_NE(text.find(row.finding), std::string::npos) << row.name << ":\n" << text;
+        EXPECT_EQ(IsSane(findings), row.isSane) << row.name << ":\n" << text;
+    }
+}
+
+/// Whatever the bytes: an answer, no exception, and sane images are those that the driver takes.
+TEST(ImageCheckTest, AnyBytes) {
+    std::uint32_t state = 1;
+    const auto random = [&state] { return state = state * 1664525 + 1013904223; };
+    int sane = 0;
+    for (int round = 0; round < 3000; ++round) {
+        EepromImage image = UsedImage();
+        for (std::uint32_t changes = random() % 4 + 1; changes > 0; --changes) {
+            const std::uint32_t at = random() >> 8;
+            image[(random() >> 28) < 12 ? Map::Table + at % 340 : at % 8192] =
+                static_cast<std::uint8_t>(random() >> 24);
+        }
+        if (IsSane(CheckImage(image))) {
+            ++sane;
+            EXPECT_NO_THROW(ImageModel{image}) << round;
+        }
+        Compare(image, UsedImage());
+    }
+    EXPECT_GT(sane, 100);
+}
+
+TEST(ImageDiffTest, ByValueThenByArea) {
+    const EepromImage a = UsedImage();
+    EXPECT_TRUE(Compare(a, a).IsEmpty());
+    EXPECT_TRUE(Compare(a, a).values.empty());
+    EepromImage b = WithCalibration(a, {{1211, "78"}}).image;
+    SetRawWord(b, 10215, 1);
+    b[1064] ^= 0xFF;
+    b[3200] ^= 0xFF;
+    b[3201] ^= 0xFF;
+    b[8191] = 0;
+    const ImageDiff diff = Compare(a, b);
+    ASSERT_EQ(diff.values.size(), 2u);
+    EXPECT_EQ(diff.values[0].kind, "calibration");
+    EXPECT_EQ(diff.values[0].id, 1211);
+    EXPECT_EQ(TextOf(*diff.values[0].a), "77");
+    EXPECT_EQ(TextOf(*diff.values[0].b), "78");
+    EXPECT_EQ(diff.values[1].kind, "word");
+    EXPECT_EQ(diff.values[1].id, 10215);
+    std::string areas;
+    for (const ImageDiff::Area& area : diff.areas) {
+        areas += area.name + " " + std::to_string(area.first) + "-" + std::to_string(area.last) + ": " +
+                 std::to_string(area.different) + " from " + std::to_string(area.firstDifference) + "\n";
+    }
+    EXPECT_EQ(areas,
+              "binary block, first part 1064-2047: 1 from 1064\n"
+              "binary block, second part 3112-4031: 2 from 3200\n"
+              "raw words 4032-4095: 4 from 4092\n"
+              "calibration 4608-4755: 1 from 4711\n"
+              "rest 4756-8191: 1 from 8191\n");
+}
+
+TEST(ImageDiffTest, AnImageThatCannotBeReadIsComparedByArea) {
+    const EepromImage a = UsedImage();
+    EepromImage b = a;
+    b[Map::Table] = 9;
+    const ImageDiff diff = Compare(a, b);
+    EXPECT_EQ(diff.unreadableA, "");
+    EXPECT_EQ(diff.unreadableB, "corrupt EAT detected!!");
+    ASSERT_EQ(diff.areas.size(), 1u);
+    EXPECT_EQ(diff.areas[0].name, "allocation table");
+}
+
+TEST(WritePiecesTest, OnlyWhatDiffersInPiecesOfAtMost256Bytes) {
+    const EepromImage a(8192, 1);
+    EepromImage b = a;
+    const auto text = [&](Granularity granularity) {
+        std::string pieces;
+        for (const WritePiece& piece : PiecesToWrite(a, b, granularity)) {
+            pieces += std::to_string(piece.address) + "+" + std::to_string(piece.length) + " ";
+        }
+        return pieces;
+    };
+    EXPECT_EQ(text(Granularity::Pieces), "");
+    EXPECT_EQ(text(Granularity::Elements), "");
+    b[5] = b[11] = b[8191] = 0;
+    EXPECT_EQ(text(Granularity::Pieces), "0+256 7936+256 ");
+    EXPECT_EQ(text(Granularity::Elements), "4+8 8188+4 ");
+    std::fill(b.begin() + 1000, b.begin() + 1600, std::uint8_t{0});
+    EXPECT_EQ(text(Granularity::Elements), "4+8 1000+256 1256+256 1512+88 8188+4 ");
+}
+
+}  // namespace
+}  // namespace Varnholt::Tests
