@@ -153,6 +153,8 @@ TEST_P(Exports, NullPointersAreRefusedAndTextsFollowTheirRules) {
         [] { EXPECT_THAT(b5ae189db26b2a1b(nullptr), StrEq("")); },
         [] { EXPECT_THAT(c288a3930ffaa9d7(), StrEq("")); },
     };
+    EXPECT_EQ(d4fb86cecc88582a(values_.data(), ""), OSTRA_OK);
+    EXPECT_EQ(LastError(), "") << "a call that succeeds clears it";
     for (const auto& ask : clearing) {
         EXPECT_EQ(d4fb86cecc88582a(nullptr, ""), OSTRA_UNKNOWN_FAILURE);
         EXPECT_EQ(LastError(), "unknown error");

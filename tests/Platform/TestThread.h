@@ -31,6 +31,7 @@ class TestThread final {
             handle_.Reset();
         }
     }
+    bool HasEnded() const { return Wait(handle_.Get(), 0) == WaitResult::Signalled; }
     Handle Get() const { return handle_.Get(); }
 
   private:

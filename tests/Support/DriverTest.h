@@ -12,6 +12,7 @@
 #include "DeviceDriver/Generic/EventListener.h"
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Platform/EventScheduler.h"
+#include "Platform/TestThread.h"
 #include "Platform/Threads.h"
 #include "Platform/WaitableObjects.h"
 #include "Support/ExpectThrow.h"
@@ -23,6 +24,7 @@ namespace Varnholt::Tests {
 using DeviceDriver::Generic::Utilities::DataException;
 using DeviceDriver::Generic::Utilities::IOException;
 using DeviceDriver::Generic::Utilities::TimeoutException;
+using BackgroundThread = Platform::TestThread;
 using Lines = std::vector<std::string>;
 
 /// The scripted driver as the device files in force.
@@ -49,29 +51,6 @@ void WaitUntil(Condition condition) {
         Platform::SleepMilliseconds(1);
     }
 }
-
-/// Runs a function on a thread of the platform; waits for its end.
-class BackgroundThread final {
-  public:
-    explicit BackgroundThread(std::function<void()> entry) : body_(std::move(entry)) {
-        thread_ = Platform::OwnedHandle(Platform::StartThread(
-            [](void* self) {
-                static_cast<BackgroundThread*>(self)->body_();
-                return std::uint32_t{0};
-            },
-            this));
-    }
-    ~BackgroundThread() { Join(); }
-    BackgroundThread(const BackgroundThread&) = delete;
-    BackgroundThread& operator=(const BackgroundThread&) = delete;
-
-    void Join() { Platform::Wait(thread_.Get(), Platform::Infinite); }
-    bool HasEnded() { return Platform::Wait(thread_.Get(), 0) == Platform::WaitResult::Signalled; }
-
-  private:
-    const std::function<void()> body_;
-    Platform::OwnedHandle thread_;
-};
 
 /// Notes messages; does what the test wants inside them.
 class RecordingListener final : public DeviceDriver::Generic::EventListener {

@@ -21,17 +21,36 @@ using Tests::WaitUntil;
 
 constexpr std::uint32_t Limit = 10000;
 
-/// Collects what it reads; tells when its thread is through.
-class Reader final : public CUsbIoReader {
+/// A stream that tells of its errors and when its thread is through.
+template <class Base>
+class Watched : public Base {
   public:
     bool WaitForExit() { return Platform::Wait(exited_.Get(), Limit) == Platform::WaitResult::Signalled; }
-    std::vector<std::uint8_t> Received() {
-        const std::lock_guard held(lock_);
-        return received_;
-    }
     std::vector<std::uint32_t> Errors() {
         const std::lock_guard held(lock_);
         return errors_;
+    }
+
+  protected:
+    std::mutex lock_;
+
+  private:
+    void OnBufferError(CUsbIoBuffer& buffer) override {
+        const std::lock_guard held(lock_);
+        errors_.push_back(buffer.Status);
+    }
+    void OnThreadExit() override { Platform::SignalEvent(exited_.Get()); }
+
+    Platform::OwnedHandle exited_{Platform::MakeAutoResetEvent()};
+    std::vector<std::uint32_t> errors_;
+};
+
+/// Collects what it reads.
+class Reader final : public Watched<CUsbIoReader> {
+  public:
+    std::vector<std::uint8_t> Received() {
+        const std::lock_guard held(lock_);
+        return received_;
     }
     std::uint32_t FreeBufferCount() { return BufferPool.CurrentCount(); }
 
@@ -56,29 +75,15 @@ class Reader final : public CUsbIoReader {
             onCompleted();
         }
     }
-    void OnBufferError(CUsbIoBuffer& buffer) override {
-        const std::lock_guard held(lock_);
-        errors_.push_back(buffer.Status);
-    }
-    void OnThreadExit() override { Platform::SignalEvent(exited_.Get()); }
 
-    Platform::OwnedHandle exited_{Platform::MakeAutoResetEvent()};
-    std::mutex lock_;
     std::vector<std::uint8_t> received_;
-    std::vector<std::uint32_t> errors_;
 };
 
 /// Sends the numbers from 1 on, one for each buffer.
-class Writer final : public CUsbIoWriter {
+class Writer final : public Watched<CUsbIoWriter> {
   public:
-    bool WaitForExit() { return Platform::Wait(exited_.Get(), Limit) == Platform::WaitResult::Signalled; }
-
     std::uint8_t writesWanted = 0;
     std::atomic<int> completed = 0;
-    std::vector<std::uint32_t> Errors() {
-        const std::lock_guard held(lock_);
-        return errors_;
-    }
 
   private:
     void PrepareBuffer(CUsbIoBuffer& buffer) override {
@@ -88,15 +93,7 @@ class Writer final : public CUsbIoWriter {
         *static_cast<std::uint8_t*>(buffer.Buffer) = ++sent_;
     }
     void OnBufferCompleted(CUsbIoBuffer&) override { ++completed; }
-    void OnBufferError(CUsbIoBuffer& buffer) override {
-        const std::lock_guard held(lock_);
-        errors_.push_back(buffer.Status);
-    }
-    void OnThreadExit() override { Platform::SignalEvent(exited_.Get()); }
 
-    Platform::OwnedHandle exited_{Platform::MakeAutoResetEvent()};
-    std::mutex lock_;
-    std::vector<std::uint32_t> errors_;
     std::uint8_t sent_ = 0;
 };
 
@@ -115,8 +112,9 @@ TEST_F(CUsbIoThreadTest, ReadsAStreamInOrder) {
     Bind(reader, BulkInEndpoint);
     std::vector<std::uint8_t> expected;
     for (std::uint8_t i = 0; i < 10; ++i) {
-        driver_.Script(BulkInEndpoint, {.data = {i, 0x80}, .after = i % 3U * 2U});
-        expected.insert(expected.end(), {i, 0x80});
+        const Tests::Bytes data(1U + i % 2U, i);  // what a buffer held before must not show behind it
+        driver_.Script(BulkInEndpoint, {.data = data, .after = i % 3U * 2U});
+        expected.insert(expected.end(), data.begin(), data.end());
     }
     reader.readsWanted = 10;
     ASSERT_TRUE(reader.AllocateBuffers(8, 3));
@@ -142,6 +140,7 @@ TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
     const Tests::Stopwatch stopwatch(clock_);
     EXPECT_TRUE(reader.ShutdownThread());
     stopwatch.ExpectAtMost(0);
+    EXPECT_THAT(driver_.TakeTranscript(), testing::Contains("control 80942084 /")) << "aborted";
     EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
     EXPECT_EQ(reader.FreeBufferCount(), 4U);
     EXPECT_TRUE(reader.ShutdownThread());
@@ -266,7 +265,10 @@ TEST(CUsbIoBufferPool, HandsOutTheBufferPutBackLast) {
     pool.Put(second);
     EXPECT_EQ(pool.CurrentCount(), 2U);
     EXPECT_EQ(pool.Get(), second);
+    EXPECT_EQ(pool.Get(), first);
+    EXPECT_EQ(first->Size, 16U);
     pool.Free();
+    EXPECT_EQ(pool.Get(), nullptr);
     EXPECT_EQ(pool.CurrentCount(), 0U);
     EXPECT_TRUE(pool.Allocate(1, 1));
 }

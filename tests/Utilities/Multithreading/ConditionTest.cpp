@@ -47,9 +47,13 @@ class ConditionTest : public testing::Test {
                 const ScopedLock lock(mutex_);
                 ++waiting_;
                 try {
-                    condition_.Wait(0);
+                    EXPECT_TRUE(condition_.Wait(0));
                 } catch (const ResourceException& exception) {
                     failure_ = exception.what();
+                    std::thread([this] {
+                        EXPECT_TRUE(mutex_.TryLock(1000)) << "a wait that has failed holds nothing";
+                        mutex_.Unlock();
+                    }).join();
                     mutex_.Lock();  // the scope's unlock finds nothing to unlock otherwise
                 }
                 --waiting_;

@@ -100,17 +100,6 @@ TEST(Property, BytesRefillTheValueAndKeepTheType) {
     EXPECT_EQ(real.SizeOf(), 0U);
 }
 
-TEST(Property, EveryBitPatternOfAFloatSurvives) {
-    for (const std::uint32_t pattern : {0x7F800001U, 0x7FC12345U, 0xFFFFFFFFU, 0x80000000U, 0x00000001U}) {
-        Property value(0.0F);
-        Bytes bytes(4);
-        for (std::size_t i = 0; i < bytes.size(); ++i) {
-            bytes[i] = static_cast<std::uint8_t>(pattern >> (8 * i));
-        }
-        EXPECT_EQ(value.Assign(bytes, false).AsByteVector(false), bytes) << std::hex << pattern;
-    }
-}
-
 TEST(Property, WithoutATypeOrAnElementNothingIsRead) {
     Property none;
     const Property noIntegers((Longs()));

@@ -28,36 +28,9 @@ class TimingAt final : public Timing_PC {
 };
 
 TEST(Timing, DifferenceInSeconds) {
-    struct Case {
-        const char* name;
-        ActualTime earlier;
-        ActualTime now;
-        double expected;
-    };
-    const std::vector<Case> cases{
-        {"equal", At(5, 250), At(5, 250), 0.0},
-        {"fraction only", At(5, 250), At(5, 750), 0.5},
-        {"whole and fraction", At(100, 0), At(101, 250), 1.25},
-        {"fraction borrows", At(10, 950), At(12, 50), 1.1},
-        {"earlier is later", At(12, 50), At(10, 950), -1.1},
-        {"farther apart than 32 bits hold", At(-2000000000, 0), At(2000000000, 0), 4e9},
-    };
-    for (const Case& row : cases) {
-        EXPECT_NEAR(TimingAt(row.now).GetDiffTime(row.earlier), row.expected, 1e-9) << row.name;
-    }
-}
-
-TEST(Timing, ActualTimeIsTheWallClockInLocalTime) {
-    const auto timing = Timing::Instance();
-    EXPECT_NE(timing.Get(), Timing::Instance().Get());
-    const ActualTime time = timing->GetActualTime();
-    EXPECT_NEAR(static_cast<double>(Platform::WallClockNow().seconds), time.seconds, 1);
-    EXPECT_NEAR(timing->GetActualTimeStamp(), static_cast<std::uint32_t>(time.seconds), 1);
-    EXPECT_LT(time.milliseconds, 1000);
-    const Platform::CalendarTime calendar = Platform::LocalCalendarTime(time.seconds);
-    EXPECT_EQ((std::vector<int>{time.year, time.month, time.day, time.hour, time.minute, time.second}),
-              (std::vector<int>{calendar.year, calendar.month, calendar.day, calendar.hour, calendar.minute,
-                                calendar.second}));
+    EXPECT_NEAR(TimingAt(At(101, 250)).GetDiffTime(At(100, 500)), 0.75, 1e-9);
+    EXPECT_NEAR(TimingAt(At(10, 950)).GetDiffTime(At(12, 50)), -1.1, 1e-9);
+    EXPECT_NEAR(TimingAt(At(2000000000, 0)).GetDiffTime(At(-2000000000, 0)), 4e9, 1e-3) << "beyond 32 bits";
 }
 
 TEST(Timing, SleepLastsAndIsSeenByTheClock) {
@@ -65,6 +38,7 @@ TEST(Timing, SleepLastsAndIsSeenByTheClock) {
     PrecisionTime start;
     start.SetToNow();
     const ActualTime earlier = timing->GetActualTime();
+    EXPECT_NEAR(earlier.seconds, static_cast<double>(Platform::WallClockNow().seconds), 1);
     timing->DeviceDriverSleep(30);
     std::int32_t seconds = 0, milliseconds = 0, microseconds = 0;
     start.GetElapsed(seconds, milliseconds, microseconds);

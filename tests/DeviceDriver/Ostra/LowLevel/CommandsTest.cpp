@@ -140,6 +140,8 @@ TEST_P(Commands, OnTheWire) {
             instrument.reset();  // over this driver a command leaves bytes to the next one
             instrument = Open();
         }
+        a = b = c = {};
+        m.assign(m.size(), 0);
         driver_.DropScript(0);
         driver_.Script(std::strstr(command.wire, "|in") ? In() : 0, {.data = command.Answer()});
         const Stopwatch watch(clock_);

@@ -172,28 +172,6 @@ TYPED_TEST(InterruptListeners, StopFromInsideAMessage) {
     EXPECT_EQ(this->driver_.Running(this->Place), 0U);
 }
 
-TYPED_TEST(InterruptListeners, EndWithAReceiverThatThrows) {
-    this->receiver_.onMessage = [](std::uint32_t) { throw std::runtime_error("receiver"); };
-    this->Script({Press});
-    this->Start();
-    this->WaitForMessages(1);
-    SleepMilliseconds(10);
-    EXPECT_EQ(this->driver_.Running(this->Place), 0U);
-    this->StopWithin(10);
-}
-
-TYPED_TEST(InterruptListeners, TakeAFailureDuringTheStopForNoMessage) {
-    std::atomic<bool> isInRead = false;
-    this->Script({{.refusal = Errors::DeviceNotConnected, .onStart = [&] {
-                       isInRead = true;
-                       SleepMilliseconds(50);
-                   }}});
-    this->Start();
-    WaitUntil([&] { return isInRead.load(); });
-    this->StopWithin(50);
-    EXPECT_THAT(this->receiver_.Codes(), IsEmpty());
-}
-
 /// The thread comes back when nobody waits for it any more, and must find its things in place.
 TYPED_TEST(InterruptListeners, AreNotHeldUpByAReceiverThatDoesNotReturn) {
     const OwnedHandle release(MakeAutoResetEvent());
@@ -206,15 +184,6 @@ TYPED_TEST(InterruptListeners, AreNotHeldUpByAReceiverThatDoesNotReturn) {
     SignalEvent(release.Get());
     this->listener_->ClearListener();  // over USBIO, after the message where the thread could not be ended
     SleepMilliseconds(10);
-}
-
-TYPED_TEST(InterruptListeners, SayWhenTheThreadCannotBeMade) {
-    InstallCallFilter([](std::string_view call) {
-        return call == "StartThread" ? Errors::NoSystemResources : Errors::Success;
-    });
-    ExpectThrow<IOException>("could not create interrupt listener thread",
-                             [this] { this->listener_->Start(); });
-    this->StopWithin(0);
 }
 
 TYPED_TEST(InterruptListeners, WorkOnTheCallersThreadToo) {
@@ -236,14 +205,6 @@ TYPED_TEST(InterruptListeners, WorkOnTheCallersThreadToo) {
 
 using NativeInterruptListener = InterruptListeners<OverNative>;
 const std::string InterruptPath = "native/1\\PIPE03";
-
-TEST_F(NativeInterruptListener, NeedsEvents) {
-    InstallCallFilter([](std::string_view call) {
-        return call == "MakeAutoResetEvent" ? Errors::NoSystemResources : Errors::Success;
-    });
-    ExpectThrow<IOException>("could not create interrupt listener events",
-                             [] { const InterruptListener other("native/1"); });
-}
 
 TEST_F(NativeInterruptListener, IsBoundedWhateverHoldsUpTheOpeningOfThePipe) {
     const struct {
@@ -294,16 +255,6 @@ TEST_F(NativeInterruptListener, EndsAReadThatCannotBeCancelledWithItsPipe) {
 
 using UsbIoInterruptListener = InterruptListeners<OverUsbIo>;
 
-TEST_F(UsbIoInterruptListener, ThrowsAnInterruptFromBeforeAway) {
-    driver_.Script(Place, {.data = {1}, .after = 1});
-    Start();
-    SleepMilliseconds(50);
-    WaitForRead();
-    listener_->Stop();
-    EXPECT_THAT(receiver_.Codes(), IsEmpty());
-    EXPECT_FALSE(listener_->IsTouched());
-}
-
 TEST_F(UsbIoInterruptListener, ReadsForTenMillisecondsAndThenForASecondEach) {
     std::vector<std::uint64_t> starts;
     for (int i = 0; i < 4; ++i) {
@@ -319,20 +270,6 @@ TEST_F(UsbIoInterruptListener, ReadsForTenMillisecondsAndThenForASecondEach) {
                     clock_.IsVirtual() ? 0 : 150'000);
     }
     EXPECT_THAT(receiver_.Codes(), IsEmpty());
-}
-
-TEST_F(UsbIoInterruptListener, SaysWhenItsThreadDoesNotReportItsStart) {
-    Script({});
-    std::atomic<bool> hasFailed = false;
-    InstallCallFilter([&](std::string_view call) {
-        return call == "SignalEvent" && !hasFailed.exchange(true) ? Errors::InvalidHandle : Errors::Success;
-    });
-    const Stopwatch watch(clock_);
-    ExpectThrow<IOException>("interrupt listener thread had timeout", [this] { listener_->Start(); });
-    watch.Expect(2000);
-    WaitForRead();  // it runs all the same
-    StopWithin(1);
-    EXPECT_EQ(driver_.Running(Place), 0U);
 }
 
 TEST_F(UsbIoInterruptListener, TakesItsReceiverAwayOnlyAfterTheMessageUnderWay) {

@@ -62,6 +62,30 @@ TEST_P(OpenedInstrument, FailuresNameTheOperationsThatTheyLeft) {
                                     "::" + transport + " PellandoFunctionalityByte::Instance " + constructor);
 }
 
+TEST_P(OpenedInstrument, SendsItsMessagesUntilTheListenerIsRemoved) {
+    for (const bool isRemoved : {false, true}) {
+        RecordingListener listener;
+        {
+            PellandoFunctionality opened(&listener, 0);
+            Platform::SleepMilliseconds(50);  // an interrupt just after the opening is thrown away
+            if (isRemoved) {
+                opened.removeListener(&listener);
+            }
+            instrument_.PressButton();
+            Platform::SleepMilliseconds(50);
+            instrument_.Unplug();
+            Platform::SleepMilliseconds(50);
+        }
+        EXPECT_EQ(listener.Codes(), isRemoved ? std::vector<std::uint32_t>()
+                                              : std::vector({DeviceDriver::Generic::MessageButtonData,
+                                                             DeviceDriver::Generic::MessageDeviceGone}));
+        instrument_.PlugIn();
+    }
+    RecordingListener untouched;
+    PellandoFunctionality(&untouched, 0);
+    EXPECT_TRUE(untouched.Codes().empty());
+}
+
 TEST_P(OpenedInstrument, ClosesWithoutWaitingForTheDeviceLock) {
     std::optional<PellandoFunctionality> opened(std::in_place, nullptr, 0);
     Varnholt::Utilities::Multithreading::Mutex mutex(std::string(Name(GetParam())) + "a");

@@ -173,19 +173,6 @@ TEST_F(EepromTest, LockGuardsWriteThrough) {
     EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites));
 }
 
-TEST_F(EepromTest, DueLogIsWrittenBeforeTheNextChange) {
-    Load();
-    ChangeLog(20);
-    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
-    eeprom_->GetLog();
-    eeprom_->GetLog(false);
-    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
-    eeprom_->SetProperty(10002, Long(21));
-    EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites));
-    EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[8]), 20U) << "the change comes behind the dump";
-    EXPECT_EQ(eeprom_->Load(10002).AsLong(), 21);
-}
-
 TEST_F(EepromTest, BinaryAreasAreWrittenAndReadDirectly) {
     Load();
     Bytes block(1904);
@@ -223,6 +210,7 @@ TEST_F(EepromTest, BinaryDataThatDoesNotFitIsRefusedBeforeAnythingIsWritten) {
              Case{10215, 5, "EEPROM access denied"},
              Case{10215, 8192, "EEPROM access denied"},
              Case{10216, 4, "EEPROM access denied"},
+             Case{10216, 0, "EEPROM access denied"},
              Case{10239, 0, "EEPROM access denied"},
              Case{10240, 4, nullptr},
              Case{10199, 4, nullptr},
@@ -274,53 +262,6 @@ TEST(EepromImages, ValuesThatChangedTheirSizeReadBackRight) {
     }
 }
 
-TEST_F(EepromTest, DumpRefusesOnlyWhatDoesNotFitTheImage) {
-    Load();
-    eeprom_->SetProperty(3013, Property(Longs(861, 9)));
-    ExpectThrow<ResourceException>("Configuration data dump target too small", [&] { eeprom_->Dump(); });
-    eeprom_->SetProperty(3013, Long(9));
-    EXPECT_EQ(Protocol::LoadBig32(&eeprom_->Dump()[4752]), 9U) << "and can when it fits again";
-}
-
-/// Where the table has a section elsewhere, the values are written where they always are all the same.
-TEST_F(EepromTest, TablesThatHaveAnythingElsewhereChangeNothingOfWhatIsWritten) {
-    constexpr std::uint32_t lowest = 0x80000000, highest = 0x7FFFFFFF;
-    struct Case {
-        const char* name;
-        std::size_t entry;  ///< in the table
-        std::uint16_t id;
-        std::uint32_t address;
-        std::size_t placeOf1211 = 4708;  ///< in the image
-    };
-    for (const Case& row : {
-             Case{"calibration elsewhere", 26, 1000, 4600, 4716},
-             Case{"a gap in the calibration", 29, 1206, 4632, 4700},
-             Case{"second log elsewhere", 13, 11000, 2044},
-             Case{"second log lacks an item", 24, 1999, 0},
-             Case{"second log far behind", 15, 11002, highest},
-             Case{"second log far before", 16, 11003, lowest},
-             Case{"main log not quite there", 12, 1, 1067},
-         }) {
-        SCOPED_TRACE(row.name);
-        eeprom_.reset();
-        instrument_.eeprom = FreshImage();
-        std::uint8_t* const entry = &instrument_.eeprom[4096 + 4 + 6 * row.entry];
-        Protocol::StoreBig16(entry, row.id);
-        Protocol::StoreBig32(entry + 2, row.address);
-        Load();
-        ChangeLog(21);
-        EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites)) << "when it was due";
-        eeprom_->SetProperty(1211, Long(77));
-        const Bytes image = eeprom_->Dump();
-        EXPECT_EQ(Protocol::LoadBig32(&image[row.placeOf1211]), 77U);
-        EXPECT_EQ(Protocol::LoadBig32(&image[8]), 21U);
-        EXPECT_EQ(Bytes(image.begin(), image.begin() + 1064),
-                  Bytes(image.begin() + 2048, image.begin() + 3112));
-        eeprom_.reset();
-        EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites)) << "at the end";
-    }
-}
-
 TEST_F(EepromTest, DestructorWritesTheLogTwiceOrReportsThatItIsLost) {
     for (const bool reported : {true, false}) {
         Load();
@@ -342,16 +283,6 @@ TEST_F(EepromTest, DestructorWritesTheLogTwiceOrReportsThatItIsLost) {
     eeprom_.reset();
     EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites));
     EXPECT_EQ(instrument_.eeprom, FreshImage());
-}
-
-TEST_F(EepromTest, FailureInTheSecondCopyOfTheLogLeavesThatOneOld) {
-    Load();
-    eeprom_->SetProperty(10002, Long(5));
-    instrument_.failingCommand = 5;
-    ExpectThrow<IOException>("the fake fails", [&] { eeprom_->DumpLog(); });
-    EXPECT_THAT(instrument_.TakeCommands(), ElementsAreArray(LogWrites.begin(), LogWrites.begin() + 6));
-    EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[8]), 5U);
-    EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[2048 + 8]), 0U);
 }
 
 /// The binary block lies right behind the log, and the table further on.
@@ -393,22 +324,6 @@ TEST_F(EepromTest, LogThatHasGrownBeyondItsAreaIsRefusedAsLongAsItIs) {
     instrument_.TakeCommands();
     eeprom_.reset();
     EXPECT_EQ(instrument_.TakeCommands().at(4).size, 36U) << "a shorter log is written as it is";
-}
-
-/// A table may give the log more than its usual area, and then has nothing else there.
-TEST_F(EepromTest, LogThatWasReadLongerThanUsualIsWrittenAsLong) {
-    for (const std::size_t end : {12U, 25U}) {  // the ends of both copies, in the table
-        std::uint8_t* const address = &instrument_.eeprom[4096 + 4 + 6 * end + 2];
-        const std::uint32_t usual = Protocol::LoadBig32(address);
-        Protocol::StoreBig32(address, usual + 8);
-        std::fill_n(&instrument_.eeprom[usual], 8, std::uint8_t{0});
-    }
-    Load();
-    ASSERT_EQ(eeprom_->GetProperty(10021).SizeOf(), 12U);
-    eeprom_->DumpLog();
-    EXPECT_EQ(instrument_.TakeCommands().at(9).size, 48U);
-    eeprom_->SetProperty(10012, Property(Longs{1, 2}));
-    EXPECT_THAT([&] { eeprom_->DumpLog(); }, testing::Throws<ResourceException>());
 }
 
 }  // namespace

@@ -164,14 +164,5 @@ TEST_F(LogTest, IncrementAddsToWhatIsThere) {
     EXPECT_THAT([&] { log.Increment(10001, std::int32_t{1}); }, testing::Throws<RuntimeException>());
 }
 
-TEST_F(LogTest, ChecksumItemMustBeThereAndHoldSomething) {
-    table_.GetDatastore().GetProperty(10000).Assign(std::int32_t{4});  // now empty
-    Store(SecondCopy, 6);
-    Store(SecondCopy + 8, 6);
-    EXPECT_EQ(Read().GetItem(10002).AsLong(), 6);
-    table_.GetDatastore().GetDatastore().pop_front();
-    ExpectThrow<ResourceException>("id 10000 doesn't exist", [&] { Read(); });
-}
-
 }  // namespace
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

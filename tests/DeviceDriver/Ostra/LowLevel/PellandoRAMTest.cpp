@@ -120,7 +120,13 @@ TEST_F(RamTest, LoadAsksOnlyForWhatIsWanted) {
     ram_.Load(set);
     EXPECT_EQ(set.GetItemCount(), 2U);
     EXPECT_EQ(ram_.Load(2007).AsLong(), 0);
+    Properties empty;
+    ram_.Load(empty);
     EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
+    Properties some("PhysicalConditions");
+    some.SetProperty(2013, Property());
+    ram_.Load(some);
+    EXPECT_THAT(CommandNames(), ElementsAre("GetMISC"));
 
     Properties conditions("PhysicalConditions");
     ram_.Load(conditions);
@@ -191,6 +197,7 @@ TEST_F(RamTest, StoresThirdParameterAndFlags) {
              Case{-1, -1, 0, 65535, 0},
              Case{100, -1, 1, 100, 1},
              Case{100, 0, 1, 100, 1},
+             Case{100, 1, 1, 1, 0},
              Case{100, 300, 1, 300, 0},
              Case{100, 300, -7, 300, 0},
              Case{100, 65537, 1, 1, 0},
@@ -315,9 +322,15 @@ TEST_F(ModeSearch, UsesTheModesFactorForTheSecondTime) {
     EXPECT_EQ(instrument_.p2, 4U) << "0.008 s in units of 100 times 20 us";
     EXPECT_FLOAT_EQ(ram_.Load(2001).AsFloat(), 0.008F);
     set_.SetProperty(2013, Long(300));
+    set_.SetProperty(2001, Property(0.0265F));
     ram_.Store(set_);
-    EXPECT_EQ(instrument_.p2, 1U) << "an instrument without modes has the time base of construction";
-    EXPECT_FALSE(ram_.IsInPerfectMode());
+    EXPECT_EQ(instrument_.p2, 3U) << "an instrument without modes has the time base of construction";
+    Want(68000);
+    for (const int misc2 : {301, 300}) {
+        set_.SetProperty(2013, Long(misc2));
+        ram_.Store(set_);
+        EXPECT_EQ(ram_.IsInPerfectMode(), misc2 == 301);
+    }
 }
 
 TEST_F(ModeSearch, RefusesTimesThatNoModeCanCount) {
@@ -352,12 +365,6 @@ TEST_F(ModeSearch, RefusesTimesThatNoModeCanCount) {
         EXPECT_FLOAT_EQ(ram_.Load(2009).AsFloat(), 0.068F) << "the time base of construction";
         instrument_.TakeCommands();
     }
-}
-
-TEST_F(ModeSearch, NeedsTheTimeBeforeItTriesAMode) {
-    set_.GetDatastore().remove_if([](const auto& entry) { return entry.first == 2009; });
-    ExpectThrow<ResourceException>("id 2009 doesn't exist", [&] { ram_.Store(set_); });
-    EXPECT_THAT(instrument_.TakeCommands(), IsEmpty());
 }
 
 /// One of so many modes that is too slow for most times.

@@ -81,6 +81,7 @@ TEST_F(NativeCommands, HandOutTheRecordsOfAScan) {
     driver_.Script(1, {.data = Counting(10, 1)});
     driver_.Script(1, {.data = Counting(10, 11)});
     instrument_.StartScan(5, 1, 0);
+    EXPECT_EQ(driver_.TakeTransfers().front(), "control 22000D 00 02 00 00 C0 00 00 00 00 00 /");
     EXPECT_EQ(NextRecord(instrument_, 5), Counting(5, 1));
     EXPECT_EQ(NextRecord(instrument_, 3), Counting(3, 6)) << "a smaller buffer takes the record's beginning";
     EXPECT_EQ(NextRecord(instrument_, 8), Counting(5, 11))

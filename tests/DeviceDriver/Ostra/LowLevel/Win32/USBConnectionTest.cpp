@@ -148,86 +148,6 @@ TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
     }
 }
 
-TEST_F(UsbConnection, ReportsAnAbandonedWait) {
-    const struct {
-        void (*operation)(USBConnection&);
-        std::uint32_t pipe;
-        const char* text;
-    } cases[] = {{SendControl, 0, "Device IO control failed "},
-                 {Read64, 1, "read data failed (wait abandoned)"},
-                 {Write64, 2, "write data failed (wait abandoned)"}};
-    for (const auto& row : cases) {
-        SCOPED_TRACE(row.text);
-        const AbandonedMutex abandoned;
-        USBConnection connection("native/1", row.pipe, NoHandle);
-        driver_.Script(row.pipe, {.after = Never, .completesThrough = abandoned.Get()});
-        ExpectThrow<TimeoutException>(row.text + ErrorSuffix(Errors::IoPending),
-                                      [&] { row.operation(connection); });
-        EXPECT_EQ(driver_.RunningTransfers(), 0u);
-        ReleaseMutex(abandoned.Get());
-    }
-}
-
-TEST_F(UsbConnection, ReportsNothingWhenToldSo) {
-    USBConnection connection("native/1", 0, NoHandle);
-    std::uint8_t data[8] = {};
-    const auto send = [&] { connection.PerformDeviceIOControl(OutwardBlock, Control, data, 8, false); };
-    const struct {
-        Answer answer;
-        std::uint64_t milliseconds;
-    } cases[] = {{{.code = Errors::DeviceNotConnected}, 1},
-                 {{.refusal = Errors::DeviceNotConnected}, 2001},
-                 {{.after = Never, .cancelledAfter = 10}, 2011}};
-    for (const auto& row : cases) {
-        const Stopwatch watch(clock_);
-        driver_.Script(0, row.answer);
-        EXPECT_NO_THROW(send());
-        watch.Expect(row.milliseconds);
-        EXPECT_EQ(driver_.RunningTransfers(), 0u);
-    }
-    connection.Close();
-    EXPECT_NO_THROW(send());
-}
-
-TEST_F(UsbConnection, WaitsWithAnEndHoweverLongTheTimeout) {
-    if (!clock_.IsVirtual()) {
-        GTEST_SKIP() << "takes weeks in real time";
-    }
-    USBConnection connection("native/1", 1, NoHandle);
-    for (const std::uint32_t timeout : {0xFFFFFFFFu, 0xFFFFFFFFu - 4999, 0xFFFFFFFFu - 5000}) {
-        const Stopwatch watch(clock_);
-        std::uint8_t byte = 0;
-        ExpectThrow<IOException>("read data failed" + ErrorSuffix(Errors::IoIncomplete),
-                                 [&] { connection.Read(&byte, 1, timeout); });
-        watch.Expect(0xFFFFFFFEu);
-    }
-}
-
-TEST_F(UsbConnection, ClosesOnceAndFailsAfterwards) {
-    const OwnedHandle event(MakeAutoResetEvent());
-    {
-        USBConnection given("native/1", 3, event.Get());
-        given.Close();
-        given.Close();
-    }
-    EXPECT_TRUE(SignalEvent(event.Get()));
-
-    USBConnection own("native/1", 1, NoHandle);
-    const Handle ownEvent = own.CompletionEvent();
-    driver_.TakeTranscript();
-    own.Close();
-    own.Close();
-    EXPECT_THAT(driver_.TakeTranscript(), ElementsAre("close native/1\\PIPE01"));
-    EXPECT_FALSE(SignalEvent(ownEvent));
-
-    const std::string suffix = ErrorSuffix(Errors::InvalidHandle);
-    ExpectThrow<IOException>("read data failed" + suffix, [&] { Read64(own); });
-    ExpectThrow<IOException>("write data failed" + suffix, [&] { Write64(own); });
-    ExpectThrow<TimeoutException>("Device IO control failed " + suffix, [&] { SendControl(own); });
-    std::vector<std::uint8_t> buffer(8);
-    EXPECT_EQ(own.Read(buffer, false), 0u);
-}
-
 class UsbConnectionVectorRead : public NativeTest {
   protected:
     std::uint32_t Read(Answer answer) {
@@ -263,19 +183,6 @@ TEST_F(UsbConnectionVectorRead, EndsWhenSomebodySignalsItsEvent) {
               2u)
         << "data that arrive during the cancellation count";
     EXPECT_THAT(driver_.TakeTransfers(), ElementsAre("read 3 [8]", "cancel 3", "read 3 [8]", "cancel 3"));
-}
-
-TEST_F(UsbConnectionVectorRead, EndsWhenThatWasRequestedBeforeItStarted) {
-    endRequested_ = true;
-    SignalEvent(event_.Get());
-    EXPECT_EQ(Read({.after = Never}), 0u);
-    EXPECT_EQ(driver_.RunningTransfers(), 0u);
-}
-
-TEST_F(UsbConnectionVectorRead, FailsWhenTheWaitDoes) {
-    ExpectThrow<IOException>("wait failed",
-                             [&] { Read({.after = Never, .completesThrough = NamesNothing()}); });
-    EXPECT_EQ(driver_.RunningTransfers(), 0u);
 }
 
 }  // namespace

@@ -124,33 +124,6 @@ TEST_F(UsbIoScan, OpenEndedScansGrow) {
     }
 }
 
-TEST_F(UsbIoScan, AReadIsPendingWhileTheOtherIsProcessed) {
-    // An instrument that completes a transfer only when it has got the next one.
-    const auto instrument = Open();
-    std::vector<bool> completed;
-    const auto completeOther = [&] { completed.push_back(driver_.Complete(BulkInEndpoint)); };
-    for (int i = 0; i < 4; ++i) {
-        driver_.Script(BulkInEndpoint,
-                       {.data = Stream(sent_, Whole), .after = Never, .onStart = completeOther});
-        sent_ += Whole;
-    }
-    driver_.Script(BulkInEndpoint, {.after = 1, .onStart = completeOther});
-    instrument->StartScan(256, 1, static_cast<std::uint32_t>(sent_));
-    EXPECT_THAT(completed, testing::ElementsAre(false, true, true, true, true));
-    EXPECT_EQ(TakeAll(*instrument, Whole), Stream(0, sent_));
-}
-
-TEST_F(UsbIoScan, WhatComesBehindTheEndIsDropped) {
-    const auto instrument = Open();
-    driver_.Script(BulkInEndpoint, {.data = Stream(0, 100), .after = 2});
-    driver_.Script(
-        BulkInEndpoint,
-        {.data = Bytes(50, 0xEE), .after = Never, .cancelledAfter = 20, .cancelledWithData = true});
-    instrument->StartScan(256, 1, 1000);
-    EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
-    EXPECT_EQ(TakeAll(*instrument, 64), Stream(0, 100));
-}
-
 TEST_F(UsbIoScan, FailedScansLeaveNothing) {
     struct Case {
         const char* name;
@@ -192,47 +165,6 @@ TEST_F(UsbIoScan, FailedScansLeaveNothing) {
     Send({10}, 1);
     instrument->StartScan(256, 1, 10000);
     EXPECT_EQ(TakeAll(*instrument, 256), Stream(0, 10)) << "and the next one works";
-}
-
-TEST_F(UsbIoScan, ThePriorityIsRaisedForTheScanOnly) {
-    const auto instrument = Open();
-    const Platform::ScopedThreadPriority usual(-1);
-    const int before = Platform::CurrentThreadPriority();
-    int during = -99;
-    driver_.Script(BulkInEndpoint, {.data = Bytes(5), .after = 1, .onStart = [&] {
-                                        during = Platform::CurrentThreadPriority();
-                                    }});
-    instrument->StartScan(256, 1, 1000);
-    // Where the system refuses a level, it stays as it was.
-    const bool mayRaise = [] {
-        const Platform::ScopedThreadPriority raised(Platform::HighestThreadPriority);
-        return Platform::CurrentThreadPriority() == Platform::HighestThreadPriority;
-    }();
-    EXPECT_EQ(during, mayRaise ? Platform::HighestThreadPriority : before);
-    EXPECT_EQ(Platform::CurrentThreadPriority(), before);
-}
-
-TEST_F(UsbIoScan, DataAreHandedOutInPiecesAndNeverBehindTheEnd) {
-    const auto instrument = Open();
-    std::uint32_t size = 4;
-    Bytes part(8, 0xEE);
-    instrument->GetScanData(part.data(), &size);
-    EXPECT_EQ(size, 0U) << "without a scan";
-
-    Send({10}, 1);
-    instrument->StartScan(256, 1, 5000);
-    std::vector<std::uint32_t> sizes;
-    Bytes all;
-    for (int i = 0; i < 4; ++i) {
-        part.assign(8, 0xEE);
-        size = 4;
-        instrument->GetScanData(part.data(), &size);
-        sizes.push_back(size);
-        all.insert(all.end(), part.data(), part.data() + size);
-        EXPECT_EQ(part[size], 0xEE);
-    }
-    EXPECT_THAT(sizes, testing::ElementsAre(4, 4, 2, 0));
-    EXPECT_EQ(all, Stream(0, 10));
 }
 
 TEST_F(UsbIoScan, MoreThanWasAskedForIsRefused) {

@@ -32,28 +32,6 @@ TEST_F(UsbIoCommands, GiveShortAnswersAsTheyCame) {
     EXPECT_THAT(buffer, ElementsAre(9, 8, 7, 0xEE, 0xEE));
 }
 
-TEST_F(UsbIoCommands, HaveTimeoutsThatDoNotWrap) {
-    const auto instrument = Open();
-    driver_.Script(BulkInEndpoint, {.data = {1}, .after = 200});
-    std::uint8_t byte = 0;
-    instrument->MeasureRequest(&byte, 1,
-                               4294963);  // * 1000 + 5000 is 32 bits wide and a few milliseconds more
-    EXPECT_EQ(byte, 1);
-}
-
-TEST_F(UsbIoCommands, WriteWithoutALimit) {
-    if (!clock_.IsVirtual()) {
-        GTEST_SKIP() << "takes minutes in real time";
-    }
-    const auto instrument = Open();
-    driver_.Script(Protocol::BulkOutEndpoint, {.after = 60'000});
-    driver_.Script(Protocol::BulkOutEndpoint, {.after = 120'000});
-    const Stopwatch watch(clock_);
-    const std::uint8_t byte = 7;
-    EXPECT_NO_THROW(instrument->WriteEEPROM({}, {}, &byte, 1));
-    watch.Expect(1 + 60'000 + 120'000);
-}
-
 class UsbIoOpening : public UsbIoTest {
   protected:
     UsbIoOpening() : UsbIoTest({"usbio/1", "usbio/2", "usbio/3"}) {}
