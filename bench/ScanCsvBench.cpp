@@ -6,6 +6,7 @@
 #include <fstream>
 #include <vector>
 
+#include "Interface/Readout.h"
 #include "Output/RecordingFile.h"
 #include "Output/RecordWriter.h"
 #include "Protocol/ByteOrder.h"
@@ -39,8 +40,7 @@ void WriteStreamed(std::ostream& out, std::span<const std::uint8_t> transfer) {
     for (std::size_t i = 0; i < transfer.size(); i += RecordSize) {
         std::vector<std::int32_t> values;
         for (std::size_t j = i; j < i + RecordSize; j += 2) {
-            const std::int32_t value = Protocol::LoadBig16(transfer.data() + j);
-            values.push_back(value > 0xF800 ? value - 0x10000 : value);
+            values.push_back(Interface::ReadingOf(Protocol::LoadBig16(transfer.data() + j)));
         }
         fmt::print(out, "{}\n", fmt::join(values, ","));
     }

@@ -51,8 +51,8 @@ std::string Session::Paint(const char* color, const std::string& text) const {
     return streams_.errFacts.showsColor ? "\x1b[" + std::string(color) + "m" + text + "\x1b[0m" : text;
 }
 
-void Session::Print(const nlohmann::ordered_json& value) {
-    PrintJson(Out(), value);
+void Session::Print(const Json& value) {
+    Out() << value.Text();
 }
 
 void Session::FlushOut() {

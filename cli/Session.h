@@ -3,7 +3,6 @@
 #include <functional>
 #include <iosfwd>
 #include <memory>
-#include <nlohmann/json_fwd.hpp>
 #include <optional>
 #include <span>
 #include <string>
@@ -28,6 +27,7 @@ struct Streams {
     std::uint32_t inputPatience = 30'000;  // milliseconds
 };
 
+class Json;
 class TrafficRecording;
 
 /// One run of the tool, as its commands see it. Its device files are in force once its action is carried out.
@@ -42,7 +42,7 @@ class Session final : public Service::Observer {
     /// For results: standard output, or standard error once `ClaimOut` was called.
     std::ostream& Out() { return outIsClaimed_ ? streams_.err : streams_.out; }
     const StreamFacts& OutFacts() const { return streams_.outFacts; }
-    void Print(const nlohmann::ordered_json& value);
+    void Print(const Json& value);
     /// What is in `Out` is on its way; throws where it cannot be written.
     void FlushOut();
 

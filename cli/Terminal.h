@@ -1,6 +1,7 @@
 #pragma once
 
 #include <functional>
+#include <memory>
 #include <string>
 
 /// What the tool asks of the system for itself; one source for each platform.
@@ -48,7 +49,7 @@ class SignalWatch final {
 
   private:
     struct State;
-    State* state_;
+    const std::unique_ptr<State> state_;
 };
 
 }  // namespace Varnholt::Cli

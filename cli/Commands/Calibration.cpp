@@ -4,7 +4,7 @@
 #include "Commands/CommonOptions.h"
 #include "Memory/MemoryTarget.h"
 #include "Output/Json.h"
-#include "Output/Table.h"
+#include "Output/Rows.h"
 #include "Output/ValueList.h"
 #include "Service/Memory/ImageEdit.h"
 #include "Service/Memory/ImageModel.h"
@@ -22,7 +22,7 @@ void Show(Session& session, const ShowOptions& options) {
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
     ImageModel model = target.Interpret([](const EepromImage& image) { return ImageModel(image); });
     if (options.memory.json) {
-        session.Print({{"source", target.Name()}, {"calibration", JsonOf(model.Calibration())}});
+        session.Print({{"source", target.Name()}, {"calibration", model.Calibration()}});
     } else {
         PrintValues(session, model.Calibration(), Vectors::Numbers);
     }
@@ -40,17 +40,17 @@ void Set(Session& session, const SetOptions& options) {
     const EditedImage edited = target.Interpret(
         [&assignments](const EepromImage& image) { return WithCalibration(image, assignments); });
     const MemoryTarget::Outcome outcome = target.Change(edited.image, options.change, Granularity::Elements);
-    Json changes = Json::array();
-    Table table({{"ID", Table::Align::Right}, {"BEFORE"}, {}, {"AFTER"}});
+    Rows changes({{"ID", "id", Table::Align::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}});
     for (const ValueChange& change : edited.changes) {
-        changes.push_back(
-            {{"id", change.id}, {"before", JsonOf(change.before)}, {"after", JsonOf(change.after)}});
-        table.AddRow({std::to_string(change.id), TextOf(change.before), "->", TextOf(change.after)});
+        changes.Add({change.id,
+                     {TextOf(change.before), Json(change.before)},
+                     "->",
+                     {TextOf(change.after), Json(change.after)}});
     }
     if (!options.memory.json) {
-        table.Print(session.Out());
+        changes.Print(session.Out());
     }
-    target.Report(outcome, options.memory.json, {{"changes", changes}});
+    target.Report(outcome, options.memory.json, {{"changes", changes.AsJson()}});
 }
 
 }  // namespace

@@ -31,13 +31,13 @@ const char* NameOf(Finding::Level level) {
 void Doctor(Session& session, const Options& options) {
     session.ChooseTransport(options.transport);
     const std::vector<Finding> findings = Diagnose(session.Context());
-    Json list = Json::array();
+    Json list{Json::Array()};
     std::optional<FailureKind> failure;
     for (const Finding& finding : findings) {
-        list.push_back({{"level", NameOf(finding.level)},
-                        {"subject", finding.subject},
-                        {"text", finding.text},
-                        {"fix", finding.fix}});
+        list.Append({{"level", NameOf(finding.level)},
+                     {"subject", finding.subject},
+                     {"text", finding.text},
+                     {"fix", finding.fix}});
         if (!failure) {
             failure = finding.failure;
         }

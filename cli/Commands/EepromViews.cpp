@@ -8,7 +8,7 @@
 #include "Memory/InputFile.h"
 #include "Memory/MemoryTarget.h"
 #include "Output/Json.h"
-#include "Output/Table.h"
+#include "Output/Rows.h"
 #include "Output/ValueList.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
@@ -39,14 +39,14 @@ Json JsonOfCopy(const LogCopy& copy) {
 }
 
 Json JsonOfImage(const MemoryTarget& target, ImageModel& model, const LogCopies& copies) {
-    Json entries = Json::array();
+    Json entries{Json::Array()};
     const ImageModel::Properties table = model.Table();
     for (const auto& [id, address] : table.GetDatastore()) {
-        entries.push_back({{"id", id}, {"address", address.AsLong()}});
+        entries.Append({{"id", id}, {"address", address.AsLong()}});
     }
-    Json words = Json::object();
+    Json words;
     for (std::uint16_t id = Ids::FirstRawWord; id <= LastWritableRawWord; ++id) {
-        words[std::to_string(id)] = RawWordOf(target.Image(), id);
+        words.Add(std::to_string(id), RawWordOf(target.Image(), id));
     }
     const std::uint8_t* const header = target.Image().data() + Map::Table;
     return {{"source", target.Name()},
@@ -54,12 +54,12 @@ Json JsonOfImage(const MemoryTarget& target, ImageModel& model, const LogCopies&
              {{"version", Protocol::LoadBig16(header + Map::TableLayout::Version)},
               {"length", Protocol::LoadBig16(header + Map::TableLayout::Length)},
               {"entries", entries}}},
-            {"calibration", JsonOf(model.Calibration())},
+            {"calibration", model.Calibration()},
             {"log",
              {{"used", copies.Used()},
               {"main", JsonOfCopy(copies.main)},
               {"second", JsonOfCopy(copies.second)},
-              {"values", JsonOf(model.Log())}}},
+              {"values", model.Log()}}},
             {"binary", fmt::format("{:02x}", fmt::join(BinaryBlockOf(target.Image()), ""))},
             {"words", words}};
 }
@@ -104,19 +104,14 @@ void Check(Session& session, const ViewOptions& options) {
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
     const std::vector<ImageFinding> findings = CheckImage(target.Image());
     const bool isSane = IsSane(findings);
+    Rows rows({{"", "severity"}, {"", "area"}, {"", "text"}});
+    for (const ImageFinding& finding : findings) {
+        rows.Add({NameOf(finding.severity), finding.area, finding.text});
+    }
     if (options.memory.json) {
-        Json list = Json::array();
-        for (const ImageFinding& finding : findings) {
-            list.push_back(
-                {{"severity", NameOf(finding.severity)}, {"area", finding.area}, {"text", finding.text}});
-        }
-        session.Print({{"source", target.Name()}, {"sane", isSane}, {"findings", list}});
+        session.Print({{"source", target.Name()}, {"sane", isSane}, {"findings", rows.AsJson()}});
     } else {
-        Table table({{}, {}, {}});
-        for (const ImageFinding& finding : findings) {
-            table.AddRow({NameOf(finding.severity), finding.area, finding.text});
-        }
-        table.Print(session.Out());
+        rows.Print(session.Out());
         session.Out() << target.Name() << (isSane ? " can be used\n" : " cannot be used as it is\n");
     }
     if (!isSane) {
@@ -141,9 +136,9 @@ std::string TextOfSide(const std::optional<Property>& value, bool isWord) {
 
 Json JsonOfSide(const std::optional<Property>& value, bool isWord) {
     if (!value) {
-        return nullptr;
+        return {};
     }
-    return isWord ? Json(static_cast<std::uint32_t>(value->AsLong())) : JsonOf(*value);
+    return isWord ? Json(static_cast<std::uint32_t>(value->AsLong())) : Json(*value);
 }
 
 std::string TextOfDifference(const ImageDiff::Value& value) {
@@ -177,28 +172,35 @@ std::string TextOfUnreadable(const ImageDiff& diff, const std::string& a, const 
     return text;
 }
 
-void PrintDiff(Session& session, const ImageDiff& diff, const std::string& a, const std::string& b) {
-    if (diff.IsEmpty()) {
-        fmt::print(session.Out(), "{} and {} are the same\n", a, b);
-        return;
+Rows RowsOf(const std::vector<ImageDiff::Value>& values) {
+    Rows rows({{"WHAT", "kind"},
+               {"ID", "id", Table::Align::Right},
+               {"DIFFERENCE"},
+               {"", "a", Table::Align::Left, false},
+               {"", "b", Table::Align::Left, false}});
+    for (const ImageDiff::Value& value : values) {
+        const bool isWord = value.kind == "word";
+        rows.Add({value.kind,
+                  value.id,
+                  TextOfDifference(value),
+                  {"", JsonOfSide(value.a, isWord)},
+                  {"", JsonOfSide(value.b, isWord)}});
     }
-    if (const std::string unreadable = TextOfUnreadable(diff, a, b); !unreadable.empty()) {
-        session.Warn("calibration and log cannot be compared: " + unreadable);
+    return rows;
+}
+
+Rows RowsOf(const std::vector<ImageDiff::Area>& areas) {
+    Rows rows({{"AREA", "area"},
+               {"ADDRESSES"},
+               {"", "first", Table::Align::Left, false},
+               {"", "last", Table::Align::Left, false},
+               {"BYTES", "differentBytes", Table::Align::Right},
+               {"FIRST AT", "firstDifference", Table::Align::Right}});
+    for (const ImageDiff::Area& area : areas) {
+        rows.Add({area.name, fmt::format("{} to {}", area.first, area.last), area.first, area.last,
+                  area.different, area.firstDifference});
     }
-    Table values({{"WHAT"}, {"ID", Table::Align::Right}, {"DIFFERENCE"}});
-    for (const ImageDiff::Value& value : diff.values) {
-        values.AddRow({value.kind, std::to_string(value.id), TextOfDifference(value)});
-    }
-    if (!values.IsEmpty()) {
-        values.Print(session.Out());
-        session.Out() << '\n';
-    }
-    Table areas({{"AREA"}, {"ADDRESSES"}, {"BYTES", Table::Align::Right}, {"FIRST AT", Table::Align::Right}});
-    for (const ImageDiff::Area& area : diff.areas) {
-        areas.AddRow({area.name, fmt::format("{} to {}", area.first, area.last),
-                      std::to_string(area.different), std::to_string(area.firstDifference)});
-    }
-    areas.Print(session.Out());
+    return rows;
 }
 
 void Diff(Session& session, const DiffOptions& options) {
@@ -207,30 +209,26 @@ void Diff(Session& session, const DiffOptions& options) {
     const MemoryTarget b(session, options.memory, MemoryTarget::Use::Read);
     const ImageDiff diff = Compare(a, b.Image());
     const std::string unreadable = TextOfUnreadable(diff, nameOfA, b.Name());
+    const Rows values = RowsOf(diff.values);
+    const Rows areas = RowsOf(diff.areas);
     if (options.memory.json) {
-        Json values = Json::array();
-        for (const ImageDiff::Value& value : diff.values) {
-            values.push_back({{"kind", value.kind},
-                              {"id", value.id},
-                              {"a", JsonOfSide(value.a, value.kind == "word")},
-                              {"b", JsonOfSide(value.b, value.kind == "word")}});
-        }
-        Json areas = Json::array();
-        for (const ImageDiff::Area& area : diff.areas) {
-            areas.push_back({{"area", area.name},
-                             {"first", area.first},
-                             {"last", area.last},
-                             {"differentBytes", area.different},
-                             {"firstDifference", area.firstDifference}});
-        }
         session.Print({{"a", nameOfA},
                        {"b", b.Name()},
                        {"same", diff.IsEmpty()},
-                       {"unreadable", unreadable.empty() ? Json(nullptr) : Json(unreadable)},
-                       {"values", values},
-                       {"areas", areas}});
+                       {"unreadable", Json::OrNull(unreadable)},
+                       {"values", values.AsJson()},
+                       {"areas", areas.AsJson()}});
+    } else if (diff.IsEmpty()) {
+        fmt::print(session.Out(), "{} and {} are the same\n", nameOfA, b.Name());
     } else {
-        PrintDiff(session, diff, nameOfA, b.Name());
+        if (!unreadable.empty()) {
+            session.Warn("calibration and log cannot be compared: " + unreadable);
+        }
+        if (!values.IsEmpty()) {
+            values.Print(session.Out());
+            session.Out() << '\n';
+        }
+        areas.Print(session.Out());
     }
     if (!diff.IsEmpty()) {
         throw Failure(FailureKind::Different, nameOfA + " and " + b.Name() + " differ");

@@ -3,7 +3,7 @@
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
-#include "Output/Table.h"
+#include "Output/Rows.h"
 #include "Service/OpenedInstrument.h"
 
 namespace Varnholt::Cli {
@@ -17,27 +17,36 @@ struct Options {
 void Identify(Session& session, const Options& options) {
     Service::OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options.instrument));
     const Service::Identity found = instrument.Identify();
-    if (options.json) {
-        session.Print({{"identifier", instrument.Identifier()},
-                       {"name", Service::ShortNameOf(instrument.Identifier())},
-                       {"chipId", found.chipId},
-                       {"misc", {found.misc1, found.misc2, found.misc3, found.misc4, found.misc5}},
-                       {"mode", found.mode},
-                       {"cpld", found.cpld},
-                       {"parameters", {found.p1, found.p2, found.p3, found.p4, found.p5}}});
-        return;
-    }
+    const std::string name = Service::ShortNameOf(instrument.Identifier());
+    const std::array misc{unsigned{found.misc1}, unsigned{found.misc2}, unsigned{found.misc3},
+                          unsigned{found.misc4}, unsigned{found.misc5}};
+    const std::array parameters{unsigned{found.p1}, unsigned{found.p2}, unsigned{found.p3},
+                                unsigned{found.p4}, unsigned{found.p5}};
+    const auto inARow = [](const auto& numbers) { return fmt::format("{}", fmt::join(numbers, "  ")); };
+    struct Line {
+        const char* label;
+        const char* member;
+        Rows::Cell cell;
+    };
+    Json result;
     Table table({{}, {}});
-    table.AddRow({"identifier", instrument.Identifier()});
-    table.AddRow({"name", Service::ShortNameOf(instrument.Identifier())});
-    table.AddRow({"chip id", found.chipId});
-    table.AddRow({"MISC m1 to m5", fmt::format("{}  {}  {}  {}  {}", found.misc1, found.misc2, found.misc3,
-                                               found.misc4, found.misc5)});
-    table.AddRow({"mode m1 to m6", fmt::format("{}", fmt::join(found.mode, "  "))});
-    table.AddRow({"CPLD", fmt::format("0x{:04X}", found.cpld)});
-    table.AddRow({"parameters p1 to p5",
-                  fmt::format("{}  {}  {}  {}  {}", found.p1, found.p2, found.p3, found.p4, found.p5)});
-    table.Print(session.Out());
+    for (const Line& line : {
+             Line{"identifier", "identifier", instrument.Identifier()},
+             Line{"name", "name", name},
+             Line{"chip id", "chipId", found.chipId},
+             Line{"MISC m1 to m5", "misc", {inARow(misc), misc}},
+             Line{"mode m1 to m6", "mode", {inARow(found.mode), found.mode}},
+             Line{"CPLD", "cpld", {fmt::format("0x{:04X}", found.cpld), found.cpld}},
+             Line{"parameters p1 to p5", "parameters", {inARow(parameters), parameters}},
+         }) {
+        result.Add(line.member, *line.cell.value);
+        table.AddRow({line.label, line.cell.text});
+    }
+    if (options.json) {
+        session.Print(result);
+    } else {
+        table.Print(session.Out());
+    }
 }
 
 }  // namespace

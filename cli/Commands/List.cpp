@@ -3,7 +3,7 @@
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
-#include "Output/Table.h"
+#include "Output/Rows.h"
 #include "SystemCommands.h"
 
 namespace Varnholt::Cli {
@@ -24,32 +24,32 @@ void List(Session& session, const Options& options) {
     session.ChooseTransport(options.instrument.transport);
     const bool isUsbIo = session.Context().UsedTransport() == Service::Context::Transport::UsbIo;
     const std::vector<std::string> connected = ListInstruments(session.Context());
-    Json instruments = Json::array();
-    Table table({{"NAME"}, {"IDENTIFIER"}, {options.chipId ? "CHIP ID" : ""}});
+    Rows instruments({{"", "identifier", Table::Align::Left, false},
+                      {"NAME", "name"},
+                      {"IDENTIFIER"},
+                      {options.chipId ? "CHIP ID" : "", "chipId"},
+                      {"", "problem", Table::Align::Left, false}});
     std::optional<Failure> failure;  // one that is used by others is none
     for (const std::string& identifier : connected) {
-        Json instrument{{"identifier", identifier}, {"name", Service::ShortNameOf(identifier)}};
-        std::string chipId;
+        Rows::Cell chipId("", std::nullopt);
+        Rows::Cell problem("", std::nullopt);
         if (options.chipId) {
             const Service::ChipIdAnswer answer = AskChipId(session.Context(), identifier);
-            chipId = answer.chipId;
-            instrument["chipId"] = chipId.empty() ? Json(nullptr) : Json(chipId);
+            chipId = answer.problem ? Rows::Cell("(not asked)", Json()) : Rows::Cell(answer.chipId);
             if (answer.problem) {
-                chipId = "(not asked)";
-                instrument["problem"] = answer.problem->what();
-                session.Warn(answer.problem->what());
+                problem = answer.problem->what();
+                session.Warn(problem.text);
                 if (ExitCodeOf(answer.problem->Kind()) != ExitCode::NotAvailable && !failure) {
                     failure = answer.problem;
                 }
             }
         }
-        instruments.push_back(instrument);
-        table.AddRow({Service::ShortNameOf(identifier), identifier, chipId});
+        instruments.Add({identifier, Service::ShortNameOf(identifier), identifier, chipId, problem});
     }
     if (options.json) {
-        session.Print({{"transport", isUsbIo ? "usbio" : "native"}, {"instruments", instruments}});
+        session.Print({{"transport", isUsbIo ? "usbio" : "native"}, {"instruments", instruments.AsJson()}});
     } else if (!connected.empty()) {
-        table.Print(session.Out());
+        instruments.Print(session.Out());
     }
     Service::FindInstrument(connected, {});  // says what to do when there is none
     if (failure) {

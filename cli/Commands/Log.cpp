@@ -28,7 +28,7 @@ void Show(Session& session, const ShowOptions& options) {
                        {"used", copies.Used()},
                        {"mainValid", copies.main.isValid},
                        {"secondValid", copies.second.isValid},
-                       {"values", JsonOf(model.Log())}});
+                       {"values", model.Log()}});
         return;
     }
     if (!copies.main.isValid) {
@@ -50,7 +50,7 @@ void Reset(Session& session, const ResetOptions& options) {
     if (!options.memory.json) {
         session.Out() << "empty log: ";
     }
-    target.Report(outcome, options.memory.json, Json::object());
+    target.Report(outcome, options.memory.json, Json(Json::Object()));
 }
 
 }  // namespace

@@ -3,7 +3,7 @@
 #include "Commands/Commands.h"
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
-#include "Output/Table.h"
+#include "Output/Rows.h"
 #include "Output/ValueList.h"
 #include "Service/Memory/PropertyText.h"
 #include "Service/Memory/RamAccess.h"
@@ -33,7 +33,7 @@ void Show(Session& session, const ShowOptions& options) {
     const auto set =
         instrument.Do([](const OpenedInstrument::Commands& commands) { return RamAccess(commands).Load(); });
     if (options.json) {
-        session.Print({{"identifier", instrument.Identifier()}, {"ram", JsonOf(set)}});
+        session.Print({{"identifier", instrument.Identifier()}, {"ram", set}});
     } else {
         PrintSet(session, set);
     }
@@ -58,20 +58,20 @@ void Set(Session& session, const SetOptions& options) {
             set = ram.StoreAndLoad(set);
         }
     });
-    Json changes = Json::array();
-    Table table({{"ID", Table::Align::Right}, {"BEFORE"}, {}, {"AFTER"}, {"MEANING"}});
+    Rows changes(
+        {{"ID", "id", Table::Align::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}, {"MEANING"}});
     for (const std::uint16_t id : ParametersToShow(assignments, before, set)) {
         const Property& old = before.GetProperty(id);
         const Property& now = set.GetProperty(id);
-        changes.push_back({{"id", id}, {"before", JsonOf(old)}, {"after", JsonOf(now)}});
-        table.AddRow({std::to_string(id), TextOf(old), "->", TextOf(now), MeaningOfParameter(id)});
+        changes.Add({id, {TextOf(old), Json(old)}, "->", {TextOf(now), Json(now)}, MeaningOfParameter(id)});
     }
     if (options.json) {
-        session.Print(
-            {{"identifier", instrument.Identifier()}, {"dryRun", options.dryRun}, {"changes", changes}});
+        session.Print({{"identifier", instrument.Identifier()},
+                       {"dryRun", options.dryRun},
+                       {"changes", changes.AsJson()}});
         return;
     }
-    table.Print(session.Out());
+    changes.Print(session.Out());
     if (options.dryRun) {
         session.Out()
             << "nothing was set; which measurement mode can count the times, and how it rounds them, "

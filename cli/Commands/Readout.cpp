@@ -87,15 +87,14 @@ class Formatter final {
             return {readout.raw.bytes.begin(), readout.raw.bytes.end()};
         }
         if (options_.json) {
-            std::ostringstream line;
-            PrintJson(line, {{"identifier", instrument_},
-                             {"readout", readout.number},
-                             {"seconds", readout.seconds},
-                             {"values", values},
-                             {"time", WallTimeText(readout.raw.time)},
-                             {"parameters", {p.p1, p.p2, p.p3, p.p4}},
-                             {"integrationTime", facts_.integrationTime}});
-            return line.str();
+            return Json({{"identifier", instrument_},
+                         {"readout", readout.number},
+                         {"seconds", readout.seconds},
+                         {"values", values},
+                         {"time", WallTimeText(readout.raw.time)},
+                         {"parameters", Json::Array{p.p1, p.p2, p.p3, p.p4}},
+                         {"integrationTime", facts_.integrationTime}})
+                .Text();
         }
         if (options_.csv) {
             return fmt::format("{},{:.3f},{},{},{},{},{},{},{}\n", readout.number, readout.seconds,
@@ -190,9 +189,6 @@ void TakeInto(RecordOutput& output, Session& session, const Options& options) {
 }
 
 void TakeReadouts(Session& session, const Options& options) {
-    if (int{options.json} + int{options.csv} + int{options.plot} + int{options.raw} > 1) {
-        throw Failure(FailureKind::BadArgument, "--json, --csv, --plot and --raw exclude each other");
-    }
     const auto output = MakeRecordOutput(session, options.output, options.raw);
     try {
         TakeInto(*output, session, options);
@@ -220,9 +216,17 @@ void AddReadout(CommandSpec app, Session& session) {
         .Between(0.0, 86400.0);
     const char* const heading = "Output (default: a table)";
     command.AddFlag("--json", options->json, "print JSON, one line for each readout").Group(heading);
-    command.AddFlag("--csv", options->csv, "print CSV, one line for each readout").Group(heading);
-    command.AddFlag("--plot", options->plot, "draw the values").Group(heading);
+    command.AddFlag("--csv", options->csv, "print CSV, one line for each readout")
+        .Excludes("--json")
+        .Group(heading);
+    command.AddFlag("--plot", options->plot, "draw the values")
+        .Excludes("--json")
+        .Excludes("--csv")
+        .Group(heading);
     command.AddFlag("--raw", options->raw, "the 256 bytes of each readout as the instrument sent them")
+        .Excludes("--json")
+        .Excludes("--csv")
+        .Excludes("--plot")
         .Group(heading);
     command.AddFlag("--ascii", options->ascii, "draw without Braille characters").Group(heading);
     command

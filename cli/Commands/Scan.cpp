@@ -79,7 +79,7 @@ void PrintSummary(Session& session, const Options& options, const std::string& i
                    {"recordSize", options.recordSize},
                    {"bytes", ending.received},
                    {"seconds", ending.seconds},
-                   {"file", file.empty() ? Json() : Json(file)},
+                   {"file", Json::OrNull(file)},
                    {"ended", ending.how}});
 }
 

@@ -6,7 +6,7 @@
 #include "Commands/CommonOptions.h"
 #include "Memory/MemoryTarget.h"
 #include "Output/Json.h"
-#include "Output/Table.h"
+#include "Output/Rows.h"
 #include "Protocol/PropertyIdentifiers.h"
 #include "Service/Memory/ImageEdit.h"
 #include "Service/Number.h"
@@ -29,11 +29,11 @@ void Get(Session& session, const GetOptions& options) {
         }
     }
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
-    Json words = Json::object();
+    Json words;
     Table table({{"ID", Table::Align::Right}, {"WORD"}, {"", Table::Align::Right}});
     for (const std::uint16_t id : ids) {
         const std::uint32_t word = RawWordOf(target.Image(), id);
-        words[std::to_string(id)] = word;
+        words.Add(std::to_string(id), word);
         table.AddRow({std::to_string(id), fmt::format("0x{:08X}", word), std::to_string(word)});
     }
     if (options.memory.json) {
@@ -65,20 +65,20 @@ void Put(Session& session, const PutOptions& options) {
     }
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     EepromImage edited = target.Image();
-    Json changes = Json::array();
-    Table table({{"ID", Table::Align::Right}, {"BEFORE"}, {}, {"AFTER"}});
+    Rows changes({{"ID", "id", Table::Align::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}});
+    const auto cell = [](std::uint32_t word) {
+        return Rows::Cell(fmt::format("0x{:08X}", word), Json(word));
+    };
     for (const Word& word : words) {
         const std::uint32_t before = RawWordOf(edited, word.id);
         SetRawWord(edited, word.id, word.value);
-        changes.push_back({{"id", word.id}, {"before", before}, {"after", word.value}});
-        table.AddRow({std::to_string(word.id), fmt::format("0x{:08X}", before), "->",
-                      fmt::format("0x{:08X}", word.value)});
+        changes.Add({word.id, cell(before), "->", cell(word.value)});
     }
     const MemoryTarget::Outcome outcome = target.Change(edited, options.change, Granularity::Elements);
     if (!options.memory.json) {
-        table.Print(session.Out());
+        changes.Print(session.Out());
     }
-    target.Report(outcome, options.memory.json, {{"changes", changes}});
+    target.Report(outcome, options.memory.json, {{"changes", changes.AsJson()}});
 }
 
 }  // namespace

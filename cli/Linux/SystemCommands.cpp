@@ -5,7 +5,7 @@
 #include "Commands/Commands.h"
 #include "ExitCode.h"
 #include "Output/Json.h"
-#include "Output/Table.h"
+#include "Output/Rows.h"
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFileSystem.h"
 #include "Platform/Usb/PcapngWriter.h"
@@ -63,26 +63,26 @@ void AddSystemCommands(CommandSpec app, Session& session) {
 }
 
 void PrintCandidates(Session& session, bool json) {
-    Json list = Json::array();
-    Table table({{"NAME"}, {"VID:PID"}, {"REGISTERED"}, {"DEVICE"}});
+    Rows rows({{"NAME", "name"},
+               {"VID:PID", "id"},
+               {"REGISTERED", "registered"},
+               {"DEVICE", "device"},
+               {"", "serial", Table::Align::Left, false},
+               {"", "node", Table::Align::Left, false}});
     for (const auto& device : Platform::Usb::ListCandidateDevices()) {
-        const std::string id = device.vendorId + ":" + device.productId;
-        const std::string text =
-            device.manufacturer + (device.manufacturer.empty() ? "" : " ") + device.product;
-        list.push_back({{"name", device.name},
-                        {"id", id},
-                        {"registered", device.registered},
-                        {"device", text},
-                        {"serial", device.serial},
-                        {"node", device.deviceNode}});
-        table.AddRow({device.name, id, device.registered ? "yes" : "no", text});
+        rows.Add({device.name,
+                  device.vendorId + ":" + device.productId,
+                  {device.registered ? "yes" : "no", device.registered},
+                  device.manufacturer + (device.manufacturer.empty() ? "" : " ") + device.product,
+                  device.serial,
+                  device.deviceNode});
     }
     if (json) {
-        session.Print({{"candidates", list}});
-    } else if (table.IsEmpty()) {
+        session.Print({{"candidates", rows.AsJson()}});
+    } else if (rows.IsEmpty()) {
         session.Note("no USB device with the instrument's endpoints is plugged in");
     } else {
-        table.Print(session.Out());
+        rows.Print(session.Out());
     }
 }
 

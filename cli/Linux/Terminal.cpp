@@ -1,3 +1,5 @@
+#include "Terminal.h"
+
 #include <fcntl.h>
 #include <pthread.h>
 #include <signal.h>
@@ -13,7 +15,6 @@
 
 #include "ExitCode.h"
 #include "Platform/Posix/StandardStreams.h"
-#include "Terminal.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -139,14 +140,14 @@ struct SignalWatch::State {
     std::thread thread;
 };
 
-SignalWatch::SignalWatch(std::function<void()> whenAsked) : state_(new State(std::move(whenAsked))) {}
+SignalWatch::SignalWatch(std::function<void()> whenAsked)
+    : state_(std::make_unique<State>(std::move(whenAsked))) {}
 
 SignalWatch::~SignalWatch() {
     state_->ending = true;
     ::pthread_kill(state_->thread.native_handle(), SIGTERM);
     state_->thread.join();
     ::pthread_sigmask(SIG_SETMASK, &state_->maskBefore, nullptr);
-    delete state_;
 }
 
 }  // namespace Varnholt::Cli

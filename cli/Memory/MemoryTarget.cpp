@@ -152,8 +152,8 @@ void MemoryTarget::Report(const Outcome& outcome, bool asJson, const Json& detai
                        {"dryRun", outcome.dryRun},
                        {"changedBytes", outcome.bytes},
                        {"pieces", outcome.pieces},
-                       {"backup", outcome.backup.empty() ? Json(nullptr) : Json(outcome.backup)}};
-        result.update(details);
+                       {"backup", Json::OrNull(outcome.backup)}};
+        result.AddAll(details);
         session_.Print(result);
         return;
     }

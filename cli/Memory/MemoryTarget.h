@@ -5,6 +5,7 @@
 #include <string>
 
 #include "Commands/CommonOptions.h"
+#include "Output/Json.h"
 #include "Service/Memory/EepromAccess.h"
 #include "Service/OpenedInstrument.h"
 #include "Utilities/Exceptions/Exceptions.h"
@@ -71,7 +72,7 @@ class MemoryTarget final {
                    Service::Granularity granularity);
 
     /// Tells the user of a change; as JSON if it is wanted, then with the members of `details` as well.
-    void Report(const Outcome& outcome, bool asJson, const nlohmann::ordered_json& details) const;
+    void Report(const Outcome& outcome, bool asJson, const Json& details) const;
 
   private:
     Failure Unusable(const std::string& reason) const;

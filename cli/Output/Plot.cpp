@@ -113,13 +113,29 @@ std::string Label(double value) {
     return fmt::format("{:.5g}", value);
 }
 
-}  // namespace
+/// What a plot needs to know before its first line is printed.
+class Plot final {
+  public:
+    Plot(std::span<const double> values, const PlotStyle& style);
 
-int PlotLines(const PlotStyle& style) {
-    return std::max(style.height, 2) + 2;
-}
+    void PrintLines(std::ostream& stream) const;
+    void PrintAxis(std::ostream& stream) const;
 
-void PrintPlot(std::ostream& stream, std::span<const double> values, const PlotStyle& style) {
+  private:
+    static Scale ScaleOf(std::span<const double> values);
+
+    const PlotStyle& style_;
+    const Scale scale_;
+    const int height_;  ///< lines
+    const int dotRows_;
+    const std::string top_, middle_, bottom_;  ///< labels
+    const int labelWidth_;
+    const int count_;  ///< values
+    const int width_;  ///< columns
+    const Raster raster_;
+};
+
+Scale Plot::ScaleOf(std::span<const double> values) {
     Scale scale;
     for (const double value : values) {
         if (std::isfinite(value)) {
@@ -127,55 +143,84 @@ void PrintPlot(std::ostream& stream, std::span<const double> values, const PlotS
         }
     }
     scale.Settle();
-    const int height = std::max(style.height, 2);
-    const std::string top = Label(scale.high);
-    const int dotRows = height * (style.braille ? DotRows : 1);
-    const int middleRow = height - 1 - height / 2;
-    const double middleDot =
-        middleRow * (style.braille ? DotRows : 1) + (style.braille ? DotRows - 1 : 0) / 2.0;
-    const std::string middle = Label(scale.low + (scale.high - scale.low) * middleDot / (dotRows - 1));
-    const std::string bottom = Label(scale.low);
-    const bool hasMiddle = height > 2;
-    const auto labelWidth =
-        static_cast<int>(std::max({top.size(), hasMiddle ? middle.size() : 0, bottom.size()}));
-    const int room = std::max(style.width - static_cast<int>(style.indent.size()) - labelWidth - 2, 1);
-    const int perCell = style.braille ? DotColumns : 1;
-    const auto count = static_cast<int>(std::min<std::size_t>(values.size(), 100000));
-    const int width = std::clamp((count + perCell - 1) / perCell, 1, room);
+    return scale;
+}
 
-    const int dotColumns = std::max(std::min(width * perCell, count), 1);
-    const Raster raster = Draw(values, scale, dotColumns, dotRows);
-    for (int line = 0; line < height; ++line) {
-        const bool isLabelled = line == 0 || line == height - 1 || line == height / 2;
-        const std::string& label = line == 0 ? top : line == height - 1 ? bottom : middle;
-        std::string text = fmt::format("{}{:>{}} {}", style.indent, isLabelled ? label : "", labelWidth,
-                                       style.braille ? (isLabelled ? "┤" : "│") : (isLabelled ? "+" : "|"));
-        const int row = height - 1 - line;
-        for (int column = 0; column < width; ++column) {
-            text += style.braille ? BrailleCell(raster, column, row) : raster.Get(column, row) ? "*" : " ";
+int HeightOf(const PlotStyle& style) {
+    return std::max(style.height, 2);
+}
+
+/// The value in the middle of the labelled line.
+std::string MiddleLabel(const Scale& scale, int height, bool braille) {
+    const int rowsOfLine = braille ? DotRows : 1;
+    const double dot = (height - 1 - height / 2) * rowsOfLine + (rowsOfLine - 1) / 2.0;
+    return Label(scale.low + (scale.high - scale.low) * dot / (height * rowsOfLine - 1));
+}
+
+int WidthOfLabels(std::initializer_list<std::size_t> widths) {
+    return static_cast<int>(std::max(widths));
+}
+
+Plot::Plot(std::span<const double> values, const PlotStyle& style)
+    : style_(style),
+      scale_(ScaleOf(values)),
+      height_(HeightOf(style)),
+      dotRows_(height_ * (style.braille ? DotRows : 1)),
+      top_(Label(scale_.high)),
+      middle_(height_ > 2 ? MiddleLabel(scale_, height_, style.braille) : ""),
+      bottom_(Label(scale_.low)),
+      labelWidth_(WidthOfLabels({top_.size(), middle_.size(), bottom_.size()})),
+      count_(static_cast<int>(std::min<std::size_t>(values.size(), 100000))),
+      width_(std::clamp(style.braille ? (count_ + DotColumns - 1) / DotColumns : count_, 1,
+                        std::max(style.width - static_cast<int>(style.indent.size()) - labelWidth_ - 2, 1))),
+      raster_(Draw(values, scale_, std::max(std::min(width_ * (style.braille ? DotColumns : 1), count_), 1),
+                   dotRows_)) {}
+
+void Plot::PrintLines(std::ostream& stream) const {
+    for (int line = 0; line < height_; ++line) {
+        const bool isLabelled = line == 0 || line == height_ - 1 || line == height_ / 2;
+        const std::string& label = line == 0 ? top_ : line == height_ - 1 ? bottom_ : middle_;
+        std::string text = fmt::format("{}{:>{}} {}", style_.indent, isLabelled ? label : "", labelWidth_,
+                                       style_.braille ? (isLabelled ? "┤" : "│") : (isLabelled ? "+" : "|"));
+        const int row = height_ - 1 - line;
+        for (int column = 0; column < width_; ++column) {
+            text += style_.braille ? BrailleCell(raster_, column, row) : raster_.Get(column, row) ? "*" : " ";
         }
         text.erase(text.find_last_not_of(' ') + 1);
         stream << text << '\n';
     }
+}
 
-    std::string axis = style.indent + std::string(static_cast<std::size_t>(labelWidth) + 1, ' ');
-    axis += style.braille ? "└" : "+";
-    std::string labels(style.indent.size() + static_cast<std::size_t>(labelWidth) + 2, ' ');
+void Plot::PrintAxis(std::ostream& stream) const {
     constexpr int labelEvery = 16;
-    for (int column = 0; column < width; ++column) {
+    const std::size_t begin = style_.indent.size() + static_cast<std::size_t>(labelWidth_) + 2;
+    std::string axis =
+        fmt::format("{}{:>{}}{}", style_.indent, "", labelWidth_ + 1, style_.braille ? "└" : "+");
+    std::string labels(begin, ' ');
+    for (int column = 0; column < width_; ++column) {
         const bool isLabelled = column % labelEvery == 0;
-        axis += style.braille ? (isLabelled ? "┬" : "─") : (isLabelled ? "+" : "-");
-        if (isLabelled) {
-            const std::string index = std::to_string(static_cast<std::int64_t>(column) * count / width);
-            const std::size_t at = style.indent.size() + static_cast<std::size_t>(labelWidth) + 2 +
-                                   static_cast<std::size_t>(column);
-            if (column == 0 || at + index.size() <= static_cast<std::size_t>(std::max(style.width, 0))) {
-                labels.resize(std::max(labels.size(), at), ' ');
-                labels += index;
-            }
+        axis += style_.braille ? (isLabelled ? "┬" : "─") : (isLabelled ? "+" : "-");
+        const std::string index = std::to_string(static_cast<std::int64_t>(column) * count_ / width_);
+        const std::size_t at = begin + static_cast<std::size_t>(column);
+        const bool fits = at + index.size() <= static_cast<std::size_t>(std::max(style_.width, 0));
+        if (isLabelled && (column == 0 || fits)) {
+            labels.resize(std::max(labels.size(), at), ' ');
+            labels += index;
         }
     }
     stream << axis << '\n' << labels << '\n';
+}
+
+}  // namespace
+
+int PlotLines(const PlotStyle& style) {
+    return HeightOf(style) + 2;
+}
+
+void PrintPlot(std::ostream& stream, std::span<const double> values, const PlotStyle& style) {
+    const Plot plot(values, style);
+    plot.PrintLines(stream);
+    plot.PrintAxis(stream);
 }
 
 }  // namespace Varnholt::Cli

@@ -6,12 +6,12 @@
 #include <charconv>
 #include <cstring>
 
+#include "Interface/Readout.h"
 #include "Protocol/ByteOrder.h"
 
 namespace Varnholt::Cli {
 namespace {
 
-constexpr std::int32_t HighestPositive = 0xF800;
 constexpr std::size_t LongestValue = 6;    // and a comma or the line's end
 constexpr std::size_t LongestNumber = 21;  // and a comma
 
@@ -22,8 +22,9 @@ std::vector<RecordCsv::Cell> RecordCsv::MakeCells() {
     for (std::int32_t i = 0; i < 0x10000; ++i) {
         Cell& cell = made[static_cast<std::size_t>(i)];
         char* const begin = cell.text.data();
-        char* const end =
-            std::to_chars(begin, begin + cell.text.size(), i > HighestPositive ? i - 0x10000 : i).ptr;
+        char* const end = std::to_chars(begin, begin + cell.text.size(),
+                                        Interface::ReadingOf(static_cast<std::uint16_t>(i)))
+                              .ptr;
         *end = ',';
         cell.length = static_cast<std::uint8_t>(end + 1 - begin);
     }

@@ -15,7 +15,7 @@ struct CsvColumns {
     bool seconds = false;  ///< since the start
 };
 
-/// Records as lines of CSV: their pairs of bytes, most significant first, those above 0xF800 negative.
+/// Records as lines of CSV: their pairs of bytes are readings, most significant byte first.
 class RecordCsv final {
   public:
     /// All records have this size, an even number of bytes.

@@ -58,12 +58,4 @@ void PrintValues(Session& session, const Properties& values, Vectors vectors) {
     }
 }
 
-Json JsonOf(const Properties& values) {
-    Json object = Json::object();
-    for (const auto& [id, value] : values.GetDatastore()) {
-        object[std::to_string(id)] = JsonOf(value);
-    }
-    return object;
-}
-
 }  // namespace Varnholt::Cli

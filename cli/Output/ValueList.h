@@ -1,7 +1,6 @@
 #pragma once
 
 #include "DeviceDriver/Generic/Configuration/Properties.h"
-#include "Output/Json.h"
 #include "Session.h"
 
 namespace Varnholt::Cli {
@@ -12,8 +11,5 @@ enum class Vectors { Plotted, Numbers };
 /// A table of identifiers and values; long vectors follow behind it, each under its identifier.
 void PrintValues(Session& session, const DeviceDriver::Generic::Configuration::Properties& values,
                  Vectors vectors);
-
-/// {"1000": [0.5, 1.5], "1211": 5, ...}
-Json JsonOf(const DeviceDriver::Generic::Configuration::Properties& values);
 
 }  // namespace Varnholt::Cli

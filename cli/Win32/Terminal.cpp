@@ -1,3 +1,5 @@
+#include "Terminal.h"
+
 #include <fcntl.h>
 #include <io.h>
 #include <windows.h>
@@ -7,7 +9,6 @@
 #include <cstdlib>
 
 #include "ExitCode.h"
-#include "Terminal.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -79,16 +80,15 @@ struct SignalWatch::State {
 };
 SignalWatch::State* SignalWatch::State::current = nullptr;
 
-SignalWatch::SignalWatch(std::function<void()> whenAsked) : state_(new State) {
+SignalWatch::SignalWatch(std::function<void()> whenAsked) : state_(std::make_unique<State>()) {
     state_->callback = std::move(whenAsked);
-    State::current = state_;
+    State::current = state_.get();
     ::SetConsoleCtrlHandler(&State::Handle, TRUE);
 }
 
 SignalWatch::~SignalWatch() {
     ::SetConsoleCtrlHandler(&State::Handle, FALSE);
     State::current = nullptr;
-    delete state_;
 }
 
 }  // namespace Varnholt::Cli

@@ -260,45 +260,31 @@ TEST_P(MemoryCommandsTest, ImagesComeFromStandardInputAndGoToStandardOutput) {
         std::string out;   ///< empty: whatever it is, it is no image
         const char* text;  ///< on standard error
     };
+    const auto piped = [](const Arguments& arguments, const EepromImage& input, ExitCode code,
+                          const std::string& out, const char* text) -> Case {
+        return {arguments, input, code, out, text};
+    };
     for (const Case& row : {
-             Case{{"calibration", "set", "1211=5", "--image", "-"},
-                  Calibrated("77"),
-                  ExitCode::Success,
-                  bytes(wanted),
-                  "byte of standard input changed"},
-             Case{{"calibration", "set", "1211=5", "--image", "-"},
-                  wanted,
-                  ExitCode::Success,
-                  bytes(wanted),
-                  ""},
-             Case{{"log", "reset", "--image", "-", "--dry-run"}, wanted, ExitCode::Success, "", ""},
-             Case{{"eeprom", "check", "/dev/stdin"}, wanted, ExitCode::Success, "", ""},
-             Case{{"eeprom", "show", "-", "--json"}, wanted, ExitCode::Success, "", ""},
-             Case{{"eeprom", "check", "-"},
-                  EepromImage(8192),
-                  ExitCode::BadData,
-                  "",
-                  "standard input has errors"},
-             Case{{"eeprom", "diff", image_, "-"}, wanted, ExitCode::Success, "", ""},
-             Case{{"eeprom", "diff", "-", "-"}, wanted, ExitCode::Usage, "", "standard input"},
-             Case{{"calibration", "set", "1211=5", "--image", "/dev/stdin"},
-                  wanted,
-                  ExitCode::Usage,
-                  "",
-                  "--image -"},
-             Case{{"eeprom", "write", "-", "--backup", "-"},
-                  wanted,
-                  ExitCode::Success,
-                  bytes(before_),
-                  "written to standard output"},
-             Case{{"write-image", "-"}, before_, ExitCode::Success, "", ""},
-             Case{{"eeprom", "restore", "-"}, EepromImage(8191), ExitCode::BadData, "", "it has 8191 bytes"},
-             Case{{"eeprom", "restore", "-"},
-                  EepromImage(8193),
-                  ExitCode::BadData,
-                  "",
-                  "more than 8192 bytes"},
-             Case{{"binary", "put", "-"}, {}, ExitCode::BadData, "", "it has 0 bytes"},
+             piped({"calibration", "set", "1211=5", "--image", "-"}, Calibrated("77"), ExitCode::Success,
+                   bytes(wanted), "byte of standard input changed"),
+             piped({"calibration", "set", "1211=5", "--image", "-"}, wanted, ExitCode::Success, bytes(wanted),
+                   ""),
+             piped({"log", "reset", "--image", "-", "--dry-run"}, wanted, ExitCode::Success, "", ""),
+             piped({"eeprom", "check", "/dev/stdin"}, wanted, ExitCode::Success, "", ""),
+             piped({"eeprom", "show", "-", "--json"}, wanted, ExitCode::Success, "", ""),
+             piped({"eeprom", "check", "-"}, EepromImage(8192), ExitCode::BadData, "",
+                   "standard input has errors"),
+             piped({"eeprom", "diff", image_, "-"}, wanted, ExitCode::Success, "", ""),
+             piped({"eeprom", "diff", "-", "-"}, wanted, ExitCode::Usage, "", "standard input"),
+             piped({"calibration", "set", "1211=5", "--image", "/dev/stdin"}, wanted, ExitCode::Usage, "",
+                   "--image -"),
+             piped({"eeprom", "write", "-", "--backup", "-"}, wanted, ExitCode::Success, bytes(before_),
+                   "written to standard output"),
+             piped({"write-image", "-"}, before_, ExitCode::Success, "", ""),
+             piped({"eeprom", "restore", "-"}, EepromImage(8191), ExitCode::BadData, "", "it has 8191 bytes"),
+             piped({"eeprom", "restore", "-"}, EepromImage(8193), ExitCode::BadData, "",
+                   "more than 8192 bytes"),
+             piped({"binary", "put", "-"}, {}, ExitCode::BadData, "", "it has 0 bytes"),
          }) {
         const PipedInput input(row.input);
         SCOPED_TRACE(testing::PrintToString(row.arguments));
@@ -484,12 +470,6 @@ TEST_P(MemoryCommandsTest, DiffNamesValuesAndAreas) {
     EXPECT_EQ(tool_.Json()["values"],
               nlohmann::json::parse(R"([{"kind":"calibration","id":1211,"a":78,"b":77}])"));
     EXPECT_EQ(tool_.Json()["areas"][0]["firstDifference"], 4711);
-}
-
-TEST_P(MemoryCommandsTest, NewMakesTheImageOfAFreshInstrument) {
-    Succeed({"eeprom", "new", image_});
-    host_.Add("fresh");
-    Succeed({"eeprom", "diff", image_, "--device", "fresh"});
 }
 
 TEST_P(MemoryCommandsTest, SeveralInstrumentsMustBeToldApartBeforeOneIsChanged) {

@@ -112,12 +112,10 @@ TEST(PlotTest, HasTheLinesThatItSaysAndFitsIntoItsWidth) {
 }
 
 TEST(JsonTest, FloatsHaveTheDigitsThatTheyNeedAndTextsAreValid) {
-    std::ostringstream out;
-    PrintJson(out, {{"a", JsonOf(0.068F)}, {"b", JsonOf(-1.0F)}, {"c", JsonOf(1e-30F)}, {"d", JsonOf(NAN)}});
-    EXPECT_EQ(out.str(), "{\"a\":0.068,\"b\":-1.0,\"c\":1e-30,\"d\":null}\n");
-    out.str({});
-    PrintJson(out, {{"path", "x\xFFy"}});
-    EXPECT_TRUE(nlohmann::json::accept(out.str())) << out.str();
+    const std::vector<std::uint8_t> bytes{7, 8};
+    EXPECT_EQ(Json({{"a", 0.068F}, {"b", -1.0F}, {"c", 1e-30F}, {"d", NAN}, {"e", bytes}, {"f", {}}}).Text(),
+              "{\"a\":0.068,\"b\":-1.0,\"c\":1e-30,\"d\":null,\"e\":[7,8],\"f\":null}\n");
+    EXPECT_TRUE(nlohmann::json::accept(Json({{"path", "x\xFFy"}}).Text()));
 }
 
 TEST(ProgressTest, Lines) {

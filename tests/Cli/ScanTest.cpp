@@ -120,21 +120,14 @@ TEST_P(ScanTest, OtherRecordSizes) {
     EXPECT_EQ(tool_.Run({"scan", "--record-size", "7"}), ExitCode::Usage) << "no 16-bit values";
 }
 
-TEST_P(ScanTest, SummaryAsJson) {
-    host_.Add("sim", Streaming(4096));
-    Succeed({"scan", "--json", "--output", folder_.Path("csv")});
-    EXPECT_EQ(tool_.Json()["records"], 16);
-    EXPECT_EQ(tool_.Json()["bytes"], 4096);
-    EXPECT_EQ(tool_.Json()["file"], folder_.Path("csv"));
-    EXPECT_EQ(tool_.Json()["ended"], "complete");
-    EXPECT_EQ(tool_.Err(), "");
-}
-
-TEST_P(ScanTest, ProgressOnATerminalOnly) {
+TEST_P(ScanTest, ProgressOnATerminalAndASummary) {
     tool_.errFacts.isTerminal = tool_.errFacts.movesCursor = true;
     host_.Add("sim", Streaming(1'000'000));
-    Succeed({"scan", "--total", "512000", "--output", folder_.Path("csv")});
+    Succeed({"scan", "--total", "512000", "--json", "--output", folder_.Path("csv")});
     EXPECT_THAT(tool_.Err(), HasSubstr("512.0 kB of 512.0 kB"));
+    EXPECT_EQ(tool_.Json()["records"], 2000);
+    EXPECT_EQ(tool_.Json()["file"], folder_.Path("csv"));
+    EXPECT_EQ(tool_.Json()["ended"], "complete");
 }
 
 /// Whatever ends a scan too early: what came is kept, as whole records and beside a file that was there, and
@@ -220,15 +213,6 @@ TEST_P(ScanTest, WhatCameIsKept) {
             }
         }
     }
-}
-
-TEST_P(ScanTest, OutputThatCannotBeWrittenEndsAScan) {
-    auto& instrument = host_.Add("sim", Streaming(100'000'000, 100'000));
-    tool_.CloseOut();
-    const Stopwatch watch(clock_);
-    Fail({"scan"}, ExitCode::File, "the output cannot be written");
-    watch.ExpectAtMost(2'000);
-    EXPECT_EQ(instrument.PendingTransfers(), 0u);
 }
 
 /// Wherever it comes: while the instrument is opened, waited for, scanned, closed.

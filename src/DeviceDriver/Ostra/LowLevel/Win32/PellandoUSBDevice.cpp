@@ -16,6 +16,7 @@
 #include "Platform/WaitableObjects.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/Instrument.h"
+#include "Protocol/MaximumDevices.h"
 #include "Utilities/Exceptions/Location.h"
 #include "Utilities/Exceptions/Trace.h"
 #include "Utilities/Multithreading/Mutex.h"
@@ -36,7 +37,6 @@ using Varnholt::Utilities::Multithreading::ScopedLock;
 
 namespace {
 
-constexpr std::uint32_t MaximumDevices = 127;
 constexpr std::uint32_t RecordsPerChunk = 10;
 constexpr std::uint32_t RecordsOfFirstRead = 2;
 constexpr std::uint32_t MaximumChunk = 65535;
@@ -341,7 +341,7 @@ const std::string& PellandoUSBDevice::GetAddress() const {
 
 std::vector<std::string> PellandoUSBDevice::GetAllDevices() try {
     std::vector<std::string> paths;
-    while (paths.size() < MaximumDevices) {
+    while (std::ssize(paths) < Protocol::MaximumDevices) {
         std::string path = ScanDevice(static_cast<std::uint16_t>(paths.size()));
         if (path.empty()) {
             break;

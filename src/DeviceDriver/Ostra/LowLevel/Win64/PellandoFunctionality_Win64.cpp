@@ -13,6 +13,7 @@
 #include "Platform/ErrorCodes.h"
 #include "Platform/ScopedThreadPriority.h"
 #include "Platform/Time.h"
+#include "Protocol/MaximumDevices.h"
 #include "UsbIo/ScopedDeviceList.h"
 #include "Utilities/Exceptions/Location.h"
 #include "Utilities/Exceptions/Trace.h"
@@ -31,7 +32,6 @@ using Varnholt::Utilities::Tools::SmartPointer;
 
 namespace {
 
-constexpr int MaximumDevices = 127;
 constexpr std::uint32_t CommandPause = 1;  // milliseconds before every vendor request
 constexpr std::uint64_t MillisecondsPerSecond = 1000;
 constexpr std::uint64_t ReadGrace = 5000;  // milliseconds on top of every time-out
@@ -104,7 +104,7 @@ void PellandoFunctionality_Win64::InitUSBIO(std::uint32_t deviceIndex) try {
     if (!list.Get()) {
         throw IOException("Unable to create device list.", Here());
     }
-    for (int number = 0; number < MaximumDevices; ++number) {
+    for (int number = 0; number < Protocol::MaximumDevices; ++number) {
         if (device_->Open(number, list.Get(), &InterfaceClass) != Status::Success) {
             break;
         }

@@ -1,13 +1,10 @@
 #include "DeviceDriver/Ostra/USB/Win64/USBBrowserImpl_Win64.h"
 
+#include "Protocol/MaximumDevices.h"
 #include "UsbIo/ScopedDeviceList.h"
 #include "Utilities/Exceptions/Trace.h"
 
 namespace Varnholt::DeviceDriver::Ostra::USB {
-
-namespace {
-constexpr int MaximumDevices = 127;
-}
 
 std::list<std::string> USBBrowserImpl_Win64::GetDevices(const std::int32_t&) try {
     const Protocol::Guid& interfaceClass = Protocol::UsbIoDriver::InterfaceClass;
@@ -17,7 +14,7 @@ std::list<std::string> USBBrowserImpl_Win64::GetDevices(const std::int32_t&) try
     if (!list.Get()) {
         return paths;
     }
-    for (int number = 0; number < MaximumDevices; ++number) {
+    for (int number = 0; number < Protocol::MaximumDevices; ++number) {
         if (device.Open(number, list.Get(), &interfaceClass) != Protocol::UsbIoDriver::Status::Success) {
             break;
         }
