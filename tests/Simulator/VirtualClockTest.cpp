@@ -36,24 +36,6 @@ TEST(VirtualTime, PassesWhileAllWait) {
     EXPECT_LT(std::chrono::steady_clock::now() - realStart, std::chrono::seconds(5));
 }
 
-/// A lock of the thread on whose stack an event is called is not the event's.
-TEST(VirtualTime, EventIsNotTheThreadThatHostsIt) {
-    VirtualClock clock(1);
-    const OwnedHandle mutex(MakeMutex(""));
-    const OwnedHandle over(MakeAutoResetEvent());
-    WaitResult inEvent{};
-    EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
-    ClockScheduler().CallAt(ClockScheduler().Now() + 1000, [&] {
-        inEvent = Wait(mutex.Get(), 5);
-        EXPECT_FALSE(ReleaseMutex(mutex.Get()));
-        SignalEvent(over.Get());
-    });
-    EXPECT_EQ(Wait(over.Get(), 5000), WaitResult::Signalled);
-    EXPECT_EQ(inEvent, WaitResult::TimedOut);
-    EXPECT_EQ(clock.ElapsedMilliseconds(), 6u);
-    EXPECT_TRUE(ReleaseMutex(mutex.Get()));
-}
-
 /// Three threads note their steps; which steps follow on which is the seed's choice and nobody else's.
 std::string OrderOfSteps(std::uint64_t seed) {
     VirtualClock clock(seed);

@@ -4,6 +4,7 @@
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoFunctionality_PC.h"
 #include "DeviceDriver/Ostra/LowLevel/Win64/PellandoFunctionality_Win64.h"
 #include "Platform/HostQueries.h"
+#include "Platform/ScopedThreadPriority.h"
 #include "Protocol/Instrument.h"
 #include "Support/Transport.h"
 #include "Win32/NativeTest.h"
@@ -219,6 +220,29 @@ TEST_P(Commands, WaitTheirTimeForData) {
     };
     expectFailureAfter(2000 + 5000, [&] { instrument->MeasureRequest(buffer.data(), 64, 2); });
     expectFailureAfter(64 + 5000, [&] { instrument->ReadEEPROM({}, {}, buffer.data(), 64); });
+}
+
+TEST_P(Commands, ScanAtRaisedPriorityAndGiveItBack) {
+    const auto instrument = Open();
+    const int before = CurrentThreadPriority();
+    const int raised = [] {
+        const ScopedThreadPriority highest(HighestThreadPriority);
+        return CurrentThreadPriority();  // where the system refuses a level, it stays as it was
+    }();
+    for (const ErrorCode code : {Errors::Success, Errors::GeneralFailure}) {
+        int during = -99;
+        driver_.Script(In(), {.data = Counting(5, 1), .code = code, .after = 1, .onStart = [&] {
+                                  during = CurrentThreadPriority();
+                              }});
+        try {
+            instrument->StartScan(5, 1, IsNative() ? 5 : 1000);
+            EXPECT_EQ(code, Errors::Success);
+        } catch (const IOException&) {
+            EXPECT_NE(code, Errors::Success);
+        }
+        EXPECT_EQ(during, raised);
+        EXPECT_EQ(CurrentThreadPriority(), before);
+    }
 }
 
 }  // namespace

@@ -1,11 +1,10 @@
-// The command set over a simulated instrument, by either transport: where failures say they passed, and
-// closing.
-#include <optional>
+// The command set over a simulated instrument, by either transport: messages, and where failures say they
+// passed.
+#include <algorithm>
 
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
 #include "Support/DriverTest.h"
 #include "Support/SimulatedHost.h"
-#include "Utilities/Multithreading/Mutex.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -84,18 +83,6 @@ TEST_P(OpenedInstrument, SendsItsMessagesUntilTheListenerIsRemoved) {
     RecordingListener untouched;
     PellandoFunctionality(&untouched, 0);
     EXPECT_TRUE(untouched.Codes().empty());
-}
-
-TEST_P(OpenedInstrument, ClosesWithoutWaitingForTheDeviceLock) {
-    std::optional<PellandoFunctionality> opened(std::in_place, nullptr, 0);
-    Varnholt::Utilities::Multithreading::Mutex mutex(std::string(Name(GetParam())) + "a");
-    mutex.Lock();
-    const Stopwatch watch(clock_);
-    BackgroundThread closer([&] { opened.reset(); });
-    WaitUntil([&] { return closer.HasEnded(); });
-    watch.ExpectAtMost(5);
-    mutex.Unlock();
-    EXPECT_FALSE(instrument_.Claimed());
 }
 
 }  // namespace

@@ -103,22 +103,6 @@ TEST_F(NativeCommands, HandOutTheRecordsOfAScan) {
     EXPECT_THAT(NextRecord(instrument_, 5), IsEmpty()) << "what came before the failure is discarded";
 }
 
-TEST_F(NativeCommands, ScanAtRaisedPriorityAndGiveItBack) {
-    int during = 0;
-    const auto look = [&] { during = CurrentThreadPriority(); };
-    const int before = CurrentThreadPriority();
-    driver_.Script(1, {.data = Counting(5, 1), .onStart = look});
-    instrument_.StartScan(5, 1, 0);
-    EXPECT_EQ(during, HighestThreadPriority);
-    EXPECT_EQ(CurrentThreadPriority(), before);
-
-    during = 0;
-    driver_.Script(1, {.code = Errors::GeneralFailure, .onStart = look});
-    EXPECT_THROW(instrument_.StartScan(5, 1, 50), IOException);
-    EXPECT_EQ(during, HighestThreadPriority);
-    EXPECT_EQ(CurrentThreadPriority(), before);
-}
-
 TEST(NativeCommandsOpening, NamesTheMissingInstrument) {
     const TestClock clock(TestTime::Virtual);
     const struct {
