@@ -9,7 +9,7 @@
 namespace Varnholt::Simulator {
 
 using namespace Platform;
-using namespace Platform::Posix;
+using namespace Platform::Linux;
 
 namespace {
 

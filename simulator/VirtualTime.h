@@ -9,20 +9,20 @@
 #include <utility>
 #include <vector>
 
-#include "Platform/Posix/Clock.h"
-#include "Platform/Posix/Kernel.h"
+#include "Platform/Linux/Clock.h"
+#include "Platform/Linux/Kernel.h"
 #include "VirtualClock.h"
 
 namespace Varnholt::Simulator {
 
 using Platform::EventScheduler;
 using Platform::WallTime;
-using Platform::Posix::BlockedCall;
-using Platform::Posix::Clock;
-using Platform::Posix::KernelHold;
-using Platform::Posix::Microseconds;
-using Platform::Posix::ThreadRecord;
-using Platform::Posix::WaitableObject;
+using Platform::Linux::BlockedCall;
+using Platform::Linux::Clock;
+using Platform::Linux::KernelHold;
+using Platform::Linux::Microseconds;
+using Platform::Linux::ThreadRecord;
+using Platform::Linux::WaitableObject;
 
 /// The clock behind `VirtualClock`. Its members are guarded by the kernel lock.
 ///

@@ -1,14 +1,14 @@
 #include <algorithm>
 
 #include "Platform/ErrorCodes.h"
-#include "Platform/Posix/RealScheduler.h"
-#include "Platform/Posix/SystemThread.h"
+#include "Platform/Linux/RealScheduler.h"
+#include "Platform/Linux/SystemThread.h"
 #include "VirtualTime.h"
 
 namespace Varnholt::Simulator {
 
 using namespace Platform;
-using namespace Platform::Posix;
+using namespace Platform::Linux;
 
 namespace {
 

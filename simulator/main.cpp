@@ -18,7 +18,7 @@
 #include "FaultPlan.h"
 #include "FreshEeprom.h"
 #include "KernelPort.h"
-#include "Platform/Posix/StandardStreams.h"
+#include "Platform/Linux/StandardStreams.h"
 #include "Platform/Usb/PcapngWriter.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/SimulatorBus.h"

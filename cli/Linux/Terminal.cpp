@@ -14,7 +14,7 @@
 #include <thread>
 
 #include "ExitCode.h"
-#include "Platform/Posix/StandardStreams.h"
+#include "Platform/Linux/StandardStreams.h"
 
 namespace Varnholt::Cli {
 namespace {

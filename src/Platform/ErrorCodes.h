@@ -3,7 +3,7 @@
 #include <cstdint>
 #include <string>
 
-/// What the library asks of an operating system. One interface, one folder per implementation (Win32, Posix),
+/// What the library asks of an operating system. One interface, one folder per implementation (Win32, Linux),
 /// chosen by the build. The comments here are the contract that each implementation keeps.
 namespace Varnholt::Platform {
 

@@ -12,7 +12,7 @@
 #include <thread>
 #include <vector>
 
-#include "Platform/Posix/HostSignalsBlocked.h"
+#include "Platform/Linux/HostSignalsBlocked.h"
 #include "Platform/Usb/LibUsbErrors.h"
 #include "Platform/Usb/LibUsbEvents.h"
 #include "Protocol/Instrument.h"
@@ -192,7 +192,7 @@ ErrorCode LibUsbDevice::Submit(Transfer& transfer) {
     }
 
     if (transfer.endpoint != Protocol::InterruptInEndpoint) {  // waited for at leisure
-        Posix::WorkOffInWaits(events_);
+        Linux::WorkOffInWaits(events_);
     }
     const std::lock_guard lock(mutex_);
     running_.reserve(running_.size() + 1);
@@ -264,7 +264,7 @@ std::shared_ptr<UsbDevice> OpenLibUsbDevice(const std::string& deviceNode, Error
     libusb_context* context = nullptr;
     int result = LIBUSB_SUCCESS;
     {
-        const Posix::HostSignalsBlocked blocked;  // libusb may start a thread
+        const Linux::HostSignalsBlocked blocked;  // libusb may start a thread
         result = libusb_init(&context);
     }
     if (result == LIBUSB_SUCCESS) {

@@ -4,7 +4,7 @@
 
 #include <algorithm>
 
-#include "Platform/Posix/HostSignalsBlocked.h"
+#include "Platform/Linux/HostSignalsBlocked.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
@@ -21,7 +21,7 @@ constexpr auto LongestStay = std::chrono::seconds(60);
 }  // namespace
 
 LibUsbEvents::LibUsbEvents(libusb_context* ownContext) : context_(ownContext) {
-    const Posix::HostSignalsBlocked blocked;
+    const Linux::HostSignalsBlocked blocked;
     thread_ = std::thread([this] { RunThread(); });
 }
 
@@ -84,10 +84,10 @@ bool LibUsbEvents::TryEnter() {
     return true;
 }
 
-void LibUsbEvents::WorkOff(Posix::Microseconds deadline) {
-    const Posix::Microseconds now = Posix::CurrentClock().Now();
-    const auto longest = static_cast<Posix::Microseconds>(std::chrono::microseconds(LongestStay).count());
-    const Posix::Microseconds stay = std::min(deadline > now ? deadline - now : 0, longest);
+void LibUsbEvents::WorkOff(Linux::Microseconds deadline) {
+    const Linux::Microseconds now = Linux::CurrentClock().Now();
+    const auto longest = static_cast<Linux::Microseconds>(std::chrono::microseconds(LongestStay).count());
+    const Linux::Microseconds stay = std::min(deadline > now ? deadline - now : 0, longest);
     timeval time{};
     time.tv_sec = static_cast<time_t>(stay / 1'000'000);
     time.tv_usec = static_cast<suseconds_t>(stay % 1'000'000);

@@ -5,7 +5,7 @@
 #include <mutex>
 #include <thread>
 
-#include "Platform/Posix/CompletionSource.h"
+#include "Platform/Linux/CompletionSource.h"
 
 struct libusb_context;
 
@@ -13,7 +13,7 @@ namespace Varnholt::Platform::Usb {
 
 /// Handles the events of one libusb context: on a thread of its own, or on one that waits for a transfer.
 /// Only this object handles them, so that nobody else takes libusb's lock of events.
-class LibUsbEvents final : public Posix::CompletionSource {
+class LibUsbEvents final : public Linux::CompletionSource {
   public:
     /// Throws std::system_error when no thread can be had. The context outlives the object's `Stop`.
     explicit LibUsbEvents(libusb_context* ownContext);
@@ -30,7 +30,7 @@ class LibUsbEvents final : public Posix::CompletionSource {
     void Stop();
 
     bool TryEnter() override;
-    void WorkOff(Posix::Microseconds deadline) override;
+    void WorkOff(Linux::Microseconds deadline) override;
     void Interrupt() override;
 
   private:

@@ -8,7 +8,7 @@
 #include <thread>
 #include <utility>
 
-#include "Platform/Posix/HostSignalsBlocked.h"
+#include "Platform/Linux/HostSignalsBlocked.h"
 #include "Platform/Usb/UsbDescriptors.h"
 #include "Platform/Usb/UsbIpSocket.h"
 
@@ -139,7 +139,7 @@ ErrorCode UsbIpDevice::Claim() {
         releaseLimit_.reset();
     }
     try {
-        const Posix::HostSignalsBlocked blocked;
+        const Linux::HostSignalsBlocked blocked;
         reader_ = std::thread([this] { Listen(); });
     } catch (const std::exception&) {  // no thread, or no memory for it
         socket_.reset();

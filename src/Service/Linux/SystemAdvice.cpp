@@ -5,7 +5,7 @@
 #include <algorithm>
 #include <iterator>
 
-#include "Platform/Posix/UserDirectory.h"
+#include "Platform/Linux/UserDirectory.h"
 
 namespace Varnholt::Service {
 namespace {
@@ -49,7 +49,7 @@ Failure DescribeMissingLock(Platform::ErrorCode code) {
     const bool isKnown = known != std::end(Reasons);
     return {FailureKind::NoLock,
             fmt::format("the lock that instruments need cannot be had in {}: {}",
-                        Platform::Posix::UserDirectory::SharedMemory,
+                        Platform::Linux::UserDirectory::SharedMemory,
                         isKnown ? known->text : Platform::ErrorText(code)),
             isKnown ? known->fix : Mount};
 }

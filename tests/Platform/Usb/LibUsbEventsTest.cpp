@@ -24,14 +24,14 @@ class LibUsbEventsTest : public testing::Test {
         events_ = std::make_shared<LibUsbEvents>(context_);
     }
     void TearDown() override {
-        Posix::WorkOffInWaits({});
+        Linux::WorkOffInWaits({});
         events_.reset();
         libusb_exit(context_);
     }
 
     static std::uint32_t Echo(void* test) {
         auto& self = *static_cast<LibUsbEventsTest*>(test);
-        Posix::WorkOffInWaits(self.events_);
+        Linux::WorkOffInWaits(self.events_);
         for (int i = 0; i < Rounds; ++i) {
             if (Wait(self.there_.Get(), LongTimeout) != WaitResult::Signalled) {
                 return 1;
@@ -55,7 +55,7 @@ TEST_F(LibUsbEventsTest, ItsThreadTakesNoSignalOfTheHost) {
 /// Each is in libusb, or about to go there, when the other wakes it.
 TEST_F(LibUsbEventsTest, ThreadsThatWakeEachOtherLoseNoSignal) {
     const OwnedHandle echo(StartThread(&LibUsbEventsTest::Echo, this));
-    Posix::WorkOffInWaits(events_);
+    Linux::WorkOffInWaits(events_);
     for (int i = 0; i < Rounds; ++i) {
         SignalEvent(there_.Get());
         ASSERT_EQ(Wait(back_.Get(), LongTimeout), WaitResult::Signalled) << "round " << i;
@@ -64,7 +64,7 @@ TEST_F(LibUsbEventsTest, ThreadsThatWakeEachOtherLoseNoSignal) {
 }
 
 TEST_F(LibUsbEventsTest, AWaitEndsInTimeAndOutlastsTheEvents) {
-    Posix::WorkOffInWaits(events_);
+    Linux::WorkOffInWaits(events_);
     EXPECT_EQ(Wait(back_.Get(), 30), WaitResult::TimedOut);
     const OwnedHandle echo(StartThread(&LibUsbEventsTest::Echo, this));
     for (int i = 0; i < Rounds; ++i) {
@@ -81,7 +81,7 @@ TEST_F(LibUsbEventsTest, AWaitEndsInTimeAndOutlastsTheEvents) {
 
 /// An aborted transfer, or the button's, may end when nobody waits.
 TEST_F(LibUsbEventsTest, AfterALongWaitTheirOwnThreadHandlesThemAgain) {
-    Posix::WorkOffInWaits(events_);
+    Linux::WorkOffInWaits(events_);
     EXPECT_EQ(Wait(back_.Get(), 50), WaitResult::TimedOut);
     const auto patienceEnds = std::chrono::steady_clock::now() + std::chrono::milliseconds(LongTimeout);
     while (libusb_event_handler_active(context_) == 0 && std::chrono::steady_clock::now() < patienceEnds) {

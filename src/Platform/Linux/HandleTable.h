@@ -1,0 +1,48 @@
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <shared_mutex>
+
+#include "Platform/Linux/WaitableObject.h"
+
+namespace Varnholt::Platform::Linux {
+
+/// Says which handle names which waitable object. A value that was never handed out, or whose object was
+/// closed, names nothing; values are not used twice as long as there are others.
+class HandleTable final {
+  public:
+    static HandleTable& Instance();
+
+    Handle Add(ObjectRef object);
+    /// Null, with `Errors::InvalidHandle` in `LastError`, when the handle names nothing.
+    ObjectRef Find(Handle handle);
+    /// As `Find`, for an object of one kind.
+    template <typename Kind>
+    std::shared_ptr<Kind> FindAs(Handle handle) {
+        auto object = std::dynamic_pointer_cast<Kind>(Find(handle));
+        if (!object) {
+            SetLastError(Errors::InvalidHandle);
+        }
+        return object;
+    }
+    bool Close(Handle handle);
+
+  private:
+    std::shared_mutex lock_;
+    std::map<std::uintptr_t, ObjectRef> objects_;  // guarded by `lock`
+    std::uintptr_t last_ = 0;                      // guarded by `lock`
+};
+
+/// Runs what makes an object and its handle. Without memory for them there is none, and `LastError` says so.
+template <typename Make>
+Handle HandleOf(Make make) {
+    try {
+        return make();
+    } catch (const std::bad_alloc&) {
+        SetLastError(Errors::NotEnoughMemory);
+        return NoHandle;
+    }
+}
+
+}  // namespace Varnholt::Platform::Linux

@@ -1,0 +1,160 @@
+#include "Platform/Linux/Kernel.h"
+
+#include <pthread.h>
+
+#include <array>
+#include <atomic>
+#include <utility>
+
+#include "Platform/Linux/Immortal.h"
+#include "Platform/Linux/MutexObject.h"
+#include "Platform/Linux/RealClock.h"
+#include "Platform/WaitableObjects.h"
+
+namespace Varnholt::Platform::Linux {
+namespace {
+
+std::mutex kernelLock;
+
+/// Whoever is to be woken when the lock is let go of; guarded by it.
+struct Wakeup {
+    Bell bell = nullptr;
+    std::shared_ptr<CompletionSource> source;
+
+    void Happen() const {
+        if (bell) {
+            bell->notify_all();
+        }
+        if (source) {
+            source->Interrupt();
+        }
+    }
+};
+Immortal<Wakeup> keptWakeup;
+
+std::atomic<Clock*> installedClock = nullptr;
+std::atomic<std::uint32_t> threadCount = 0;
+
+thread_local ThreadRecord* currentThread = nullptr;
+
+Bell BellOf(std::uint32_t thread) {
+    constexpr std::size_t Bells = 64;
+    static Immortal<std::array<std::condition_variable, Bells>> bells;
+    return &(*bells)[thread % Bells];
+}
+
+void ForgetThread(void* record) {
+    auto& thread = *static_cast<ThreadRecord*>(record);
+    // The mutexes are abandoned under the record's own name.
+    ThreadRecord* const before = BindCurrentThread(&thread);
+    AbandonOwned(thread);
+    thread.source.reset();
+    BindCurrentThread(before == &thread ? nullptr : before);
+}
+
+/// Notices the end of threads that somebody else started. A `thread_local` with a destructor would keep this
+/// library from being unloaded for as long as a thread lives that once used it.
+class EndOfThreadHook final {
+  public:
+    EndOfThreadHook() : valid_(pthread_key_create(&key_, ForgetThread) == 0) {}
+    ~EndOfThreadHook() {
+        if (!valid_) {
+            return;
+        }
+        if (void* const record = pthread_getspecific(key_)) {
+            pthread_setspecific(key_, nullptr);
+            ForgetThread(record);
+        }
+        pthread_key_delete(key_);
+        valid_ = false;
+    }
+    EndOfThreadHook(const EndOfThreadHook&) = delete;
+    EndOfThreadHook& operator=(const EndOfThreadHook&) = delete;
+
+    void Watch(ThreadRecord& thread) {
+        if (valid_) {
+            pthread_setspecific(key_, &thread);
+        }
+    }
+
+  private:
+    pthread_key_t key_{};
+    bool valid_;
+} endOfThread;
+
+}  // namespace
+
+KernelHold::KernelHold() : std::unique_lock<std::mutex>(kernelLock) {}
+
+KernelHold::~KernelHold() {
+    if (owns_lock()) {
+        unlock();
+    }
+}
+
+void KernelHold::unlock() {
+    const Wakeup wakeup = std::exchange(*keptWakeup, {});
+    std::unique_lock<std::mutex>::unlock();
+    wakeup.Happen();
+}
+
+void KernelHold::RingOnRelease(const Bell& bell) {
+    RingKept();  // one place is enough: hardly anybody wakes two
+    (*keptWakeup).bell = bell;
+}
+
+void KernelHold::InterruptOnRelease(const std::shared_ptr<CompletionSource>& source) {
+    RingKept();
+    (*keptWakeup).source = source;
+}
+
+void KernelHold::RingKept() {
+    std::exchange(*keptWakeup, {}).Happen();
+}
+
+ThreadRecord::ThreadRecord() : number(++threadCount), turn(BellOf(number)) {}
+
+ThreadRecord& CurrentThread() {
+    if (!currentThread) {
+        thread_local Immortal<ThreadRecord> own;
+        currentThread = &*own;
+        endOfThread.Watch(*currentThread);
+    }
+    return *currentThread;
+}
+
+bool IsCurrentThread(const ThreadRecord& thread) {
+    return &thread == currentThread;
+}
+
+ThreadRecord* BindCurrentThread(ThreadRecord* thread) {
+    return std::exchange(currentThread, thread);
+}
+
+void AbandonOwned(ThreadRecord& thread) {
+    std::vector<std::shared_ptr<MutexObject>> abandoned;  // may die with this, after the lock is gone
+    const KernelHold hold;
+    abandoned.swap(thread.owned);
+    for (const auto& mutex : abandoned) {
+        mutex->Abandon();
+    }
+}
+
+void WorkOffInWaits(const std::weak_ptr<CompletionSource>& source) {
+    CurrentThread().source = source;
+}
+
+Clock& CurrentClock() {
+    Clock* const clock = installedClock.load(std::memory_order_acquire);
+    return clock ? *clock : RealClock::Instance();
+}
+
+void InstallClock(Clock* clock) {
+    installedClock.store(clock, std::memory_order_release);
+}
+
+Microseconds DeadlineAfter(std::uint32_t timeout) {
+    return timeout == Infinite ? Never : CurrentClock().Now() + Microseconds{timeout} * 1000;
+}
+
+}  // namespace Varnholt::Platform::Linux

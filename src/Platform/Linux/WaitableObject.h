@@ -1,0 +1,77 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <span>
+#include <string>
+
+#include "Platform/ErrorCodes.h"
+#include "Platform/Linux/Kernel.h"
+#include "Platform/WaitableObjects.h"
+
+namespace Varnholt::Platform::Linux {
+
+class WaitableObject;
+class Waiter;
+
+using ObjectRef = std::shared_ptr<WaitableObject>;
+
+/// One of the objects that a wait is for, and the wait's place in its queue. On the stack of the thread that
+/// waits: a wait takes no memory.
+struct WaitEntry {
+    ObjectRef object;
+    Waiter* waiter = nullptr;
+    WaitEntry* previous = nullptr;
+    WaitEntry* next = nullptr;
+};
+
+/// Something a thread can wait for. All operations with the kernel lock held unless they say otherwise.
+///
+/// What an object has to give is handed to the threads that wait for it, first come first served, by the
+/// thread that makes it available: two signals in a row end two waits, however late the waiting threads run.
+class WaitableObject {
+  public:
+    enum class Taken { No, Yes, Abandoned };
+
+    WaitableObject() = default;
+    virtual ~WaitableObject() = default;
+    WaitableObject(const WaitableObject&) = delete;
+    WaitableObject& operator=(const WaitableObject&) = delete;
+
+    /// Takes for `taker` what a wait takes, if it is there.
+    virtual Taken TryTake(ThreadRecord& taker) = 0;
+    /// Signals or releases the object by one, for `SignalAndWait`.
+    virtual ErrorCode Signal(ThreadRecord& signaller) = 0;
+    /// False when `taker` must be the calling thread; who waits is then woken to take the object himself.
+    virtual bool CanBeTakenForOthers() const { return true; }
+    /// True when another process may have to make the object available. `Changes` then counts what may have
+    /// made it so, and `AwaitChange`, without the kernel lock, returns soon after it has passed `seen`, and
+    /// after `limit` at the latest.
+    virtual bool IsHeldElsewhere() const { return false; }
+    virtual std::uint32_t Changes() const { return 0; }
+    virtual void AwaitChange(std::uint32_t /*seen*/, Microseconds /*limit*/) {}
+    /// After a wait of the caller has taken the object, without the kernel lock.
+    virtual void AfterWait() {}
+    /// The last handle is closed by `closer`.
+    virtual void LastHandleClosed(ThreadRecord& /*closer*/) {}
+    virtual std::string Describe() const = 0;
+
+  protected:
+    void OfferToWaiters();
+
+  private:
+    friend class Waiter;
+    void Enqueue(WaitEntry& entry);
+    void Dequeue(WaitEntry& entry);
+    WaitEntry* first_ = nullptr;  ///< has waited longest
+    WaitEntry* last_ = nullptr;
+    friend class HandleTable;
+    std::size_t handles_ = 0;
+};
+
+/// Waits until the object of one of `entries` could be taken for the calling thread. With the kernel lock
+/// held; lets go of it while blocked.
+WaitAnyResult WaitForAny(KernelHold& hold, std::span<WaitEntry> entries, Microseconds deadline);
+
+}  // namespace Varnholt::Platform::Linux

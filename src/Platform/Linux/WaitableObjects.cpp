@@ -1,0 +1,162 @@
+#include "Platform/WaitableObjects.h"
+
+#include <algorithm>
+#include <array>
+
+#include "Platform/CallFilter.h"
+#include "Platform/Linux/EventObject.h"
+#include "Platform/Linux/HandleTable.h"
+#include "Platform/Linux/MutexObject.h"
+#include "Platform/Linux/NamedObjects.h"
+#include "Platform/Linux/SemaphoreObject.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+using namespace Linux;
+
+/// The limit that Windows sets.
+constexpr std::size_t MostObjectsPerWait = 64;
+
+bool Succeeded(ErrorCode code) {
+    if (code != Errors::Success) {
+        SetLastError(code);
+    }
+    return code == Errors::Success;
+}
+
+Handle AddIfMade(ObjectRef object) {
+    return object ? HandleTable::Instance().Add(std::move(object)) : NoHandle;
+}
+
+/// Runs `action` on the object with the kernel lock held, where another thread may go first and last.
+template <typename Kind, typename Action>
+bool OnObject(Handle handle, Action action) {
+    const auto object = HandleTable::Instance().FindAs<Kind>(handle);
+    if (!object) {
+        return false;
+    }
+    KernelHold hold;
+    CurrentClock().Preempt(hold);
+    const ErrorCode code = action(*object);
+    CurrentClock().Preempt(hold);
+    return Succeeded(code);
+}
+
+/// Throws nothing, because destructors wait: a mutex that there is no memory to own is not acquired.
+WaitAnyResult WaitForObjects(std::span<WaitEntry> entries, std::uint32_t timeout) try {
+    const Microseconds deadline = DeadlineAfter(timeout);
+    WaitAnyResult outcome{};
+    {
+        KernelHold hold;
+        CurrentClock().Preempt(hold);
+        outcome = WaitForAny(hold, entries, deadline);
+    }
+    if (outcome.result == WaitResult::Signalled) {
+        entries[outcome.index].object->AfterWait();
+    }
+    return outcome;
+} catch (const std::bad_alloc&) {
+    SetLastError(Errors::NotEnoughMemory);
+    return {WaitResult::Failed, 0};
+}
+
+}  // namespace
+
+Handle MakeAutoResetEvent() {
+    if (CallMustFail("MakeAutoResetEvent")) {
+        return NoHandle;
+    }
+    return HandleOf([] { return AddIfMade(std::make_shared<EventObject>()); });
+}
+
+bool SignalEvent(Handle event) {
+    return !CallMustFail("SignalEvent") &&
+           OnObject<EventObject>(event, [](EventObject& object) { return object.Signal(CurrentThread()); });
+}
+
+Handle MakeMutex(const std::string& name) {
+    if (CallMustFail("MakeMutex")) {
+        return NoHandle;
+    }
+    return HandleOf(
+        [&] { return AddIfMade(name.empty() ? std::make_shared<MutexObject>() : OpenNamedMutex(name)); });
+}
+
+bool ReleaseMutex(Handle mutex) {
+    return !CallMustFail("ReleaseMutex") &&
+           OnObject<MutexObject>(mutex, [](MutexObject& object) { return object.Release(CurrentThread()); });
+}
+
+Handle MakeSemaphore(std::int32_t initialCount, std::int32_t maximumCount, const std::string& name) {
+    if (CallMustFail("MakeSemaphore")) {
+        return NoHandle;
+    }
+    if (initialCount < 0 || maximumCount <= 0 || initialCount > maximumCount) {
+        SetLastError(Errors::InvalidParameter);
+        return NoHandle;
+    }
+    return HandleOf([&] {
+        return AddIfMade(name.empty() ? std::make_shared<LocalSemaphore>(initialCount, maximumCount)
+                                      : OpenNamedSemaphore(initialCount, maximumCount, name));
+    });
+}
+
+bool ReleaseSemaphore(Handle semaphore, std::int32_t count) {
+    return !CallMustFail("ReleaseSemaphore") &&
+           OnObject<SemaphoreObject>(semaphore,
+                                     [count](SemaphoreObject& object) { return object.Release(count); });
+}
+
+WaitResult Wait(Handle handle, std::uint32_t timeout) {
+    if (CallMustFail("Wait")) {
+        return WaitResult::Failed;
+    }
+    std::array entries{WaitEntry{HandleTable::Instance().Find(handle)}};
+    return entries[0].object ? WaitForObjects(entries, timeout).result : WaitResult::Failed;
+}
+
+WaitAnyResult WaitAny(std::span<const Handle> handles, std::uint32_t timeout) {
+    if (CallMustFail("WaitAny")) {
+        return {WaitResult::Failed, 0};
+    }
+    if (handles.empty() || handles.size() > MostObjectsPerWait) {
+        SetLastError(Errors::InvalidParameter);
+        return {WaitResult::Failed, 0};
+    }
+    std::array<WaitEntry, MostObjectsPerWait> entries;
+    for (std::size_t i = 0; i < handles.size(); ++i) {
+        entries[i].object = HandleTable::Instance().Find(handles[i]);
+        if (!entries[i].object) {
+            return {WaitResult::Failed, 0};
+        }
+    }
+    return WaitForObjects(std::span(entries).first(handles.size()), timeout);
+}
+
+WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) {
+    if (CallMustFail("SignalAndWait")) {
+        return WaitResult::Failed;
+    }
+    const ObjectRef signalled = HandleTable::Instance().Find(toSignal);
+    std::array entries{WaitEntry{signalled ? HandleTable::Instance().Find(toWait) : nullptr}};
+    if (!entries[0].object) {
+        return WaitResult::Failed;
+    }
+    const Microseconds deadline = DeadlineAfter(timeout);
+    WaitResult result{};
+    {
+        KernelHold hold;
+        CurrentClock().Preempt(hold);
+        if (!Succeeded(signalled->Signal(CurrentThread()))) {
+            return WaitResult::Failed;
+        }
+        result = WaitForAny(hold, entries, deadline).result;
+    }
+    if (result == WaitResult::Signalled) {
+        entries[0].object->AfterWait();
+    }
+    return result;
+}
+
+}  // namespace Varnholt::Platform

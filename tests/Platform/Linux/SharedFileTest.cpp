@@ -1,0 +1,161 @@
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <set>
+
+#include "Platform/ErrorCodes.h"
+#include "Platform/Linux/SharedFile.h"
+#include "Platform/WaitableObjects.h"
+#include "UniqueName.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+using Linux::SharedFile;
+using Linux::UserDirectory;
+
+std::string PathOf(const std::string& name) {
+    return UserDirectory::Open()->Path() + "/" + SharedFile::FileNameOf("mutex", name);
+}
+
+/// A name whose file the test may tamper with.
+class SharedFiles : public testing::Test {
+  protected:
+    void TearDown() override { std::filesystem::remove(path_); }
+
+    const std::string name_ = UniqueName("tampered");
+    const std::string path_ = PathOf(name_);
+};
+
+bool CanBeUsed(const OwnedHandle& mutex) {
+    return mutex && Wait(mutex.Get(), 0) == WaitResult::Signalled && ReleaseMutex(mutex.Get());
+}
+
+TEST_F(SharedFiles, AreTheUsersOwnAndGoWithTheLastHandle) {
+    OwnedHandle first(MakeMutex(name_));
+    OwnedHandle second(MakeMutex(name_));
+    struct stat state {};
+    ASSERT_EQ(stat(path_.c_str(), &state), 0);
+    EXPECT_EQ(state.st_mode & 0777, 0600u);
+    EXPECT_EQ(state.st_uid, geteuid());
+    first.Reset();
+    EXPECT_TRUE(std::filesystem::exists(path_));
+    second.Reset();
+    EXPECT_FALSE(std::filesystem::exists(path_));
+}
+
+TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
+    struct {
+        const char* text;
+        std::function<void(const std::string&)> make;
+    } const cases[] = {
+        {"empty", [](const std::string& file) { std::ofstream{file}; }},
+        {"short", [](const std::string& file) { std::ofstream(file) << "OSTRA"; }},
+        {"garbage of a page",
+         [](const std::string& file) { std::ofstream(file) << std::string(4096, '\xFF'); }},
+        {"garbage of the same size",
+         [](const std::string& file) {
+             const OwnedHandle mutex(MakeMutex(UniqueName("size")));
+             const auto size =
+                 static_cast<std::size_t>(std::filesystem::file_size(PathOf(UniqueName("size"))));
+             std::ofstream(file) << std::string(size, '\x5A');
+         }},
+    };
+    for (const auto& content : cases) {
+        SCOPED_TRACE(content.text);
+        content.make(path_);
+        const int user = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
+        ASSERT_EQ(flock(user, LOCK_SH), 0);
+        SetLastError(Errors::Success);
+        EXPECT_EQ(MakeMutex(name_), NoHandle);
+        EXPECT_EQ(LastError(), Errors::InvalidData);
+        close(user);
+        EXPECT_TRUE(CanBeUsed(OwnedHandle(MakeMutex(name_))));
+        EXPECT_FALSE(std::filesystem::exists(path_));
+    }
+}
+
+TEST_F(SharedFiles, ThatAreNoFilesOfOursAreRefused) {
+    struct {
+        const char* text;
+        std::function<bool(const std::string&)> make;
+    } const cases[] = {
+        {"link", [](const std::string& file) { return symlink("/dev/null", file.c_str()) == 0; }},
+        {"directory", [](const std::string& file) { return mkdir(file.c_str(), 0700) == 0; }},
+        {"named pipe", [](const std::string& file) { return mkfifo(file.c_str(), 0600) == 0; }},
+        {"file of another user",
+         [](const std::string& file) {
+             std::ofstream{file};
+             return chown(file.c_str(), 1, 1) == 0;
+         }},
+    };
+    for (const auto& found : cases) {
+        SCOPED_TRACE(found.text);
+        if (!found.make(path_)) {
+            EXPECT_NE(geteuid(), 0u);  // only root can give a file away
+            continue;
+        }
+        SetLastError(Errors::Success);
+        EXPECT_EQ(MakeMutex(name_), NoHandle);
+        EXPECT_EQ(LastError(), Errors::AccessDenied);
+        std::filesystem::remove(path_);
+    }
+}
+
+/// A process that died left its file behind, and in it a mutex that is still owned.
+TEST_F(SharedFiles, OfTheDeadAreTakenOver) {
+    const pid_t child = fork();
+    if (child == 0) {
+        const Handle mutex = MakeMutex(name_);
+        Wait(mutex, 0);
+        std::_Exit(0);
+    }
+    int status = 0;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    ASSERT_TRUE(std::filesystem::exists(path_));
+    OwnedHandle mutex(MakeMutex(name_));
+    EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Abandoned);
+    EXPECT_TRUE(ReleaseMutex(mutex.Get()));
+    mutex.Reset();
+    EXPECT_FALSE(std::filesystem::exists(path_));
+}
+
+/// Somebody who keeps the file locked for himself makes it unusable, but holds nobody up for good.
+TEST_F(SharedFiles, ThatAreLockedAreBusy) {
+    std::ofstream{path_};
+    const int user = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
+    ASSERT_EQ(flock(user, LOCK_EX), 0);
+    EXPECT_EQ(MakeMutex(name_), NoHandle);
+    EXPECT_EQ(LastError(), Errors::Busy);
+    close(user);
+}
+
+TEST(SharedFileNames, AreFileNamesOfBoundedLengthAndDiffer) {
+    const std::string names[] = {"a",
+                                 "A",
+                                 "a/b",
+                                 "a%2Fb",
+                                 "..",
+                                 R"(\\?\usb#vid_04b4&pid_8613#5&1c&0&2#{00873fdf-61a8-11d1})",
+                                 std::string(500, '/'),
+                                 std::string(500, '/') + "a",
+                                 std::string(500, '/') + "b"};
+    std::set<std::string> fileNames;
+    for (const std::string& name : names) {
+        const std::string fileName = SharedFile::FileNameOf("mutex", name);
+        EXPECT_EQ(fileName.find('/'), std::string::npos) << fileName;
+        EXPECT_LE(fileName.size(), 200u);
+        EXPECT_TRUE(fileNames.insert(fileName).second) << fileName;
+    }
+    EXPECT_NE(SharedFile::FileNameOf("mutex", "a"), SharedFile::FileNameOf("semaphore", "a"));
+}
+
+}  // namespace
+}  // namespace Varnholt::Platform
