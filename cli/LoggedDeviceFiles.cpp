@@ -3,12 +3,13 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+#include <mutex>
 #include <optional>
 #include <span>
 #include <utility>
 
+#include "Capture/DescribeRequest.h"
 #include "Protocol/ByteOrder.h"
-#include "Protocol/DescribeTransfer.h"
 #include "Protocol/Instrument.h"
 #include "Protocol/NativeDriver.h"
 #include "Protocol/UsbIoDriver.h"
@@ -68,7 +69,7 @@ LoggedDeviceFiles::Handle LoggedDeviceFiles::Open(const std::string& path) {
     const Handle file = below_.Open(path);
     const std::string interruptPipe = Native::PipeSuffix + std::to_string(Native::InterruptPipe);
     if (file != Platform::InvalidHandle() && path.ends_with(interruptPipe)) {
-        const Platform::CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         interruptFiles_.push_back(file);
     }
     return file;
@@ -76,7 +77,7 @@ LoggedDeviceFiles::Handle LoggedDeviceFiles::Open(const std::string& path) {
 
 bool LoggedDeviceFiles::CloseFile(Handle file) {
     {
-        const Platform::CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         std::erase(interruptFiles_, file);
         std::erase_if(running_, [file](const RunningTransfer& transfer) { return transfer.file == file; });
     }
@@ -86,7 +87,7 @@ bool LoggedDeviceFiles::CloseFile(Handle file) {
 void LoggedDeviceFiles::Tell(const Description& describe, std::uint32_t transferred, bool succeeded) {
     const Platform::ErrorCode code = Platform::LastError();
     {
-        const Platform::CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         log_(describe(transferred) + (succeeded ? "" : TextOfFailure(code)));
     }
     Platform::SetLastError(code);
@@ -97,7 +98,7 @@ bool LoggedDeviceFiles::StartTransfer(Handle file, const Overlapped& record, Des
                                       Start start) {
     {
         // Before the start: its end may be learnt of on another thread.
-        const Platform::CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         std::erase_if(running_,
                       [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
         running_.push_back({&record, file, describe});
@@ -106,7 +107,7 @@ bool LoggedDeviceFiles::StartTransfer(Handle file, const Overlapped& record, Des
     if (!completed && Platform::LastError() != Platform::Errors::IoPending) {
         Tell(describe, 0, false);
         const Platform::ErrorCode code = Platform::LastError();
-        const Platform::CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         std::erase_if(running_,
                       [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
         Platform::SetLastError(code);
@@ -117,7 +118,7 @@ bool LoggedDeviceFiles::StartTransfer(Handle file, const Overlapped& record, Des
 bool LoggedDeviceFiles::StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) {
     bool isInterrupt = false;
     {
-        const Platform::CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         isInterrupt = std::ranges::find(interruptFiles_, file) != interruptFiles_.end();
     }
     return StartTransfer(
@@ -144,7 +145,7 @@ bool LoggedDeviceFiles::StartControl(Handle file, std::uint32_t code, const void
         return below_.StartControl(file, code, input, inputSize, output, outputSize, record);
     };
     if (code == UsbIo::Control::BindPipe && inputSize > 0 && *block == Protocol::InterruptInEndpoint) {
-        const Platform::CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         interruptFiles_.push_back(file);
     }
     const std::optional<VendorRequest> request = VendorRequestOf(code, {block, inputSize});
@@ -156,7 +157,7 @@ bool LoggedDeviceFiles::StartControl(Handle file, std::uint32_t code, const void
         [request = *request, data = static_cast<const std::uint8_t*>(output),
          outputSize](std::uint32_t transferred) {
             const std::uint32_t known = request.isIn ? std::min(transferred, outputSize) : outputSize;
-            return Protocol::DescribeRequest(request.request, request.value, {data, known});
+            return Capture::DescribeRequest(request.request, request.value, {data, known});
         },
         start);
 }
@@ -169,7 +170,7 @@ bool LoggedDeviceFiles::GetResult(Handle file, Overlapped& record, std::uint32_t
     }
     Description describe;
     {
-        const Platform::CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         const auto found = std::ranges::find(running_, &record, &RunningTransfer::record);
         if (found != running_.end()) {
             describe = std::move(found->describe);

@@ -49,7 +49,7 @@ class LoggedDeviceFiles final : public Platform::DeviceFileSystem {
 
     Platform::DeviceFileSystem& below_;
     const Log log_;
-    Platform::CriticalSection section_;  ///< guards what follows, and the log
+    Platform::RecursiveMutex section_;  ///< guards what follows, and the log
     std::vector<RunningTransfer> running_;
     std::vector<Handle> interruptFiles_;  ///< whose reads wait for the button
 };

@@ -2,8 +2,8 @@
 
 #include <utility>
 
-#include "Platform/Usb/InterceptingDevice.h"
-#include "Protocol/DescribeTransfer.h"
+#include "Capture/DescribeRequest.h"
+#include "Capture/InterceptingDevice.h"
 #include "Protocol/Instrument.h"
 #include "TransferRecorder.h"
 
@@ -25,7 +25,7 @@ std::string Describe(const Transfer& transfer) {
         return name + " " + std::to_string(transfer.actualLength) + " of " + std::to_string(transfer.length);
     }
     if ((transfer.setup.requestType & typeMask) == vendorType) {
-        return Protocol::DescribeRequest(
+        return Capture::DescribeRequest(
             transfer.setup.request, transfer.setup.value,
             {transfer.data, transfer.IsIn() ? transfer.actualLength : transfer.length});
     }
@@ -33,7 +33,7 @@ std::string Describe(const Transfer& transfer) {
            std::to_string(transfer.setup.value) + " index " + std::to_string(transfer.setup.index);
 }
 
-class LoggedDevice final : public Platform::Usb::InterceptingDevice {
+class LoggedDevice final : public Capture::InterceptingDevice {
   public:
     LoggedDevice(std::shared_ptr<UsbDevice> behind, Log tell)
         : InterceptingDevice(std::move(behind)), log_(std::move(tell)) {}

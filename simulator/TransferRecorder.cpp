@@ -4,12 +4,12 @@
 #include <map>
 #include <utility>
 
-#include "Platform/Usb/InterceptingDevice.h"
+#include "Capture/InterceptingDevice.h"
 #include "Protocol/Instrument.h"
 
 namespace Varnholt::Simulator {
 
-using Platform::Usb::InterceptingDevice;
+using Capture::InterceptingDevice;
 using Platform::Usb::Transfer;
 using Platform::Usb::TransferStatus;
 using Platform::Usb::UsbDevice;

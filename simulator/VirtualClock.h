@@ -8,7 +8,7 @@
 namespace Varnholt::Simulator {
 
 /// For tests: replaces the time of the whole platform layer by one that passes only while every thread waits.
-/// A time-out of five seconds costs microseconds, and what happens in which order is repeatable. POSIX only.
+/// A time-out of five seconds costs microseconds, and what happens in which order is repeatable. Linux only.
 ///
 /// The clock's threads are the one that made it and those that `StartThread` starts meanwhile. Exactly one of
 /// them runs at a time; a platform call may hand over to another that could run, as the seed decides. When
@@ -18,7 +18,7 @@ namespace Varnholt::Simulator {
 /// with nobody else to run takes a microsecond, so that a loop that polls comes to an end.
 ///
 /// What the clock asks of the code under test: a thread that waits for another does so by platform calls, and
-/// no lock but those of the platform (`CriticalSection`, a mutex) is held across a platform call that can
+/// no lock but those of the platform (`RecursiveMutex`, a mutex) is held across a platform call that can
 /// block or hand over: waits, sleeps, signals, releases, `StartThread`. (`CallAt`, `Forget` and the time
 /// queries do not hand over.) Other threads, such as `std::thread`s, may signal and poll but not block.
 ///

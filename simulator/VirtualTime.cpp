@@ -43,14 +43,14 @@ VirtualTime::VirtualTime(std::uint64_t seed)
       installer_(CurrentThread()),
       threads_{&hostedEvent_, &eventThread_, &installer_},
       threadsAtRest_(threads_.size()) {
-    const KernelHold hold;
+    const DispatcherLock hold;
     installer_.state = State::Running;
     InstallClock(this);
 }
 
 VirtualTime::~VirtualTime() {
     decltype(events_) dropped;
-    KernelHold hold;
+    DispatcherLock hold;
     WaitingForThreads call(installer_);
     awaitingEnd_ = &call;
     while (threads_.size() > threadsAtRest_ && !call.hopeless) {
@@ -72,7 +72,7 @@ VirtualTime::~VirtualTime() {
 }
 
 void VirtualTime::HandleDeadlock(VirtualClock::DeadlockHandler newHandler) {
-    const KernelHold hold;
+    const DispatcherLock hold;
     handler_ = std::move(newHandler);
 }
 
@@ -110,7 +110,7 @@ ThreadRecord* VirtualTime::ChooseReady() {
     return nullptr;
 }
 
-void VirtualTime::Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) {
+void VirtualTime::Block(DispatcherLock& hold, BlockedCall& call, Microseconds deadline) {
     ThreadRecord& self = call.thread;
     if (self.state != State::Running) {
         Abort("A thread that the virtual clock does not know wants to wait for " + call.Describe() +
@@ -132,7 +132,7 @@ void VirtualTime::Wake(BlockedCall& call) {
 }
 
 /// The other process lives in real time: as much of it passes as the wait takes of ours.
-void VirtualTime::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
+void VirtualTime::BlockOnOtherProcess(DispatcherLock& hold, BlockedCall& call, Microseconds deadline,
                                       Microseconds period, WaitableObject* /*only*/, std::uint32_t /*seen*/) {
     Block(hold, call, std::min(deadline, now_ + period));
     if (!call.woken) {
@@ -143,7 +143,7 @@ void VirtualTime::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Micro
 }
 
 /// Called by a thread that gave up being `Running`; returns once it is again.
-void VirtualTime::HandOver(KernelHold& hold, ThreadRecord& self) {
+void VirtualTime::HandOver(DispatcherLock& hold, ThreadRecord& self) {
     while (self.state != State::Running) {
         ThreadRecord* const next = ChooseReady();
         if (!next) {
@@ -158,12 +158,12 @@ void VirtualTime::HandOver(KernelHold& hold, ThreadRecord& self) {
     }
 }
 
-void VirtualTime::AwaitTurn(KernelHold& hold, ThreadRecord& self) {
+void VirtualTime::AwaitTurn(DispatcherLock& hold, ThreadRecord& self) {
     hold.Wait(*self.turn, [&self] { return self.state == State::Running || self.mustAdvance; });
     self.mustAdvance = false;
 }
 
-void VirtualTime::Preempt(KernelHold& hold) {
+void VirtualTime::Preempt(DispatcherLock& hold) {
     ThreadRecord& self = CurrentThread();
     if (self.state != State::Running || !std::ranges::any_of(threads_, [](const ThreadRecord* thread) {
             return thread->state == State::Ready;
@@ -176,7 +176,7 @@ void VirtualTime::Preempt(KernelHold& hold) {
     }
 }
 
-void VirtualTime::GiveUpSlice(KernelHold& hold) {
+void VirtualTime::GiveUpSlice(DispatcherLock& hold) {
     ThreadRecord& self = CurrentThread();
     if (self.state != State::Running) {
         return;
@@ -195,7 +195,7 @@ void VirtualTime::GiveUpSlice(KernelHold& hold) {
 }
 
 /// Nobody can run at the present time, which therefore ends.
-void VirtualTime::Advance(KernelHold& hold, ThreadRecord& self) {
+void VirtualTime::Advance(DispatcherLock& hold, ThreadRecord& self) {
     Microseconds deadline = Never;
     for (const ThreadRecord* const thread : threads_) {
         if (thread->state == State::Blocked) {
@@ -242,22 +242,22 @@ void VirtualTime::PassOn() {
     (*blocked)->turn->notify_all();
 }
 
-void VirtualTime::ThreadMade(KernelHold& /*hold*/, ThreadRecord& thread) {
+void VirtualTime::ThreadMade(DispatcherLock& /*hold*/, ThreadRecord& thread) {
     thread.state = State::Ready;
     threads_.push_back(&thread);
 }
 
-void VirtualTime::ThreadBegins(KernelHold& hold, ThreadRecord& thread) {
+void VirtualTime::ThreadBegins(DispatcherLock& hold, ThreadRecord& thread) {
     if (thread.state != State::Unknown) {
         AwaitTurn(hold, thread);
     }
 }
 
-void VirtualTime::ThreadNeverBegan(KernelHold& /*hold*/, ThreadRecord& thread) {
+void VirtualTime::ThreadNeverBegan(DispatcherLock& /*hold*/, ThreadRecord& thread) {
     std::erase(threads_, &thread);
 }
 
-void VirtualTime::ThreadEnds(KernelHold& /*hold*/, ThreadRecord& thread) {
+void VirtualTime::ThreadEnds(DispatcherLock& /*hold*/, ThreadRecord& thread) {
     if (thread.state == State::Unknown) {
         return;  // of the time before the clock
     }
@@ -269,7 +269,7 @@ void VirtualTime::ThreadEnds(KernelHold& /*hold*/, ThreadRecord& thread) {
     PassOn();
 }
 
-void VirtualTime::ReportDeadlock(KernelHold& hold) {
+void VirtualTime::ReportDeadlock(DispatcherLock& hold) {
     const std::string report = "Deadlock: every thread waits and nothing can wake it.\n" + DescribeThreads();
     const VirtualClock::DeadlockHandler handle = handler_;
     if (!handle) {

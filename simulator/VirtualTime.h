@@ -10,7 +10,7 @@
 #include <vector>
 
 #include "Platform/Linux/Clock.h"
-#include "Platform/Linux/Kernel.h"
+#include "Platform/Linux/Dispatcher.h"
 #include "VirtualClock.h"
 
 namespace Varnholt::Simulator {
@@ -19,12 +19,12 @@ using Platform::EventScheduler;
 using Platform::WallTime;
 using Platform::Linux::BlockedCall;
 using Platform::Linux::Clock;
-using Platform::Linux::KernelHold;
+using Platform::Linux::DispatcherLock;
 using Platform::Linux::Microseconds;
 using Platform::Linux::ThreadRecord;
 using Platform::Linux::WaitableObject;
 
-/// The clock behind `VirtualClock`. Its members are guarded by the kernel lock.
+/// The clock behind `VirtualClock`. Its members are guarded by the dispatcher lock.
 ///
 /// Who may run is passed on like a baton: the record of the thread that has it is in state `Running`, and a
 /// thread whose record is not waits at its own condition variable. Whoever finds that nobody is `Ready` moves
@@ -41,21 +41,21 @@ class VirtualTime final : public Clock, private EventScheduler {
     Microseconds Elapsed() const { return now_ - Start; }
     void HandleDeadlock(VirtualClock::DeadlockHandler handler);
 
-    bool TakesTurns() const override { return true; }
+    bool IsCooperative() const override { return true; }
     Microseconds Now() override { return now_; }
     WallTime Wall() override;
     EventScheduler& Scheduler() override { return *this; }
 
-    void Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) override;
+    void Block(DispatcherLock& hold, BlockedCall& call, Microseconds deadline) override;
     void Wake(BlockedCall& call) override;
-    void BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline, Microseconds period,
-                             WaitableObject* only, std::uint32_t seen) override;
-    void Preempt(KernelHold& hold) override;
-    void GiveUpSlice(KernelHold& hold) override;
-    void ThreadMade(KernelHold& hold, ThreadRecord& thread) override;
-    void ThreadBegins(KernelHold& hold, ThreadRecord& thread) override;
-    void ThreadEnds(KernelHold& hold, ThreadRecord& thread) override;
-    void ThreadNeverBegan(KernelHold& hold, ThreadRecord& thread) override;
+    void BlockOnOtherProcess(DispatcherLock& hold, BlockedCall& call, Microseconds deadline,
+                             Microseconds period, WaitableObject* only, std::uint32_t seen) override;
+    void Preempt(DispatcherLock& hold) override;
+    void GiveUpSlice(DispatcherLock& hold) override;
+    void ThreadMade(DispatcherLock& hold, ThreadRecord& thread) override;
+    void ThreadBegins(DispatcherLock& hold, ThreadRecord& thread) override;
+    void ThreadEnds(DispatcherLock& hold, ThreadRecord& thread) override;
+    void ThreadNeverBegan(DispatcherLock& hold, ThreadRecord& thread) override;
 
   private:
     using State = ThreadRecord::State;
@@ -66,16 +66,16 @@ class VirtualTime final : public Clock, private EventScheduler {
     bool IsDue(const ThreadRecord& thread) const;
     ThreadRecord* ChooseReady();
     std::uint64_t Random();
-    void HandOver(KernelHold& hold, ThreadRecord& self);
-    void AwaitTurn(KernelHold& hold, ThreadRecord& self);
-    void Advance(KernelHold& hold, ThreadRecord& self);
+    void HandOver(DispatcherLock& hold, ThreadRecord& self);
+    void AwaitTurn(DispatcherLock& hold, ThreadRecord& self);
+    void Advance(DispatcherLock& hold, ThreadRecord& self);
     bool CanHost(const ThreadRecord& thread);
-    void HostEvent(KernelHold& hold, ThreadRecord& host);
-    void CallEvent(KernelHold& hold, ThreadRecord& as);
+    void HostEvent(DispatcherLock& hold, ThreadRecord& host);
+    void CallEvent(DispatcherLock& hold, ThreadRecord& as);
     void PassOn();
     static void* RunEventThread(void* time);
-    void ServeEvents(KernelHold& hold);
-    void ReportDeadlock(KernelHold& hold);
+    void ServeEvents(DispatcherLock& hold);
+    void ReportDeadlock(DispatcherLock& hold);
     std::string DescribeThreads() const;
 
     /// Not 0, which could be taken for no time at all.

@@ -22,7 +22,7 @@ class WaitingForEvent final : public BlockedCall {
 
 EventScheduler::EventId VirtualTime::CallAt(std::uint64_t time, std::function<void()> event) {
     const EventId id = NewEventId();
-    const KernelHold hold;
+    const DispatcherLock hold;
     events_.emplace(std::pair(time, id), std::move(event));
     return id;
 }
@@ -30,7 +30,7 @@ EventScheduler::EventId VirtualTime::CallAt(std::uint64_t time, std::function<vo
 void VirtualTime::Forget(EventId id) {
     std::function<void()> dropped;
     ThreadRecord& self = CurrentThread();
-    KernelHold hold;
+    DispatcherLock hold;
     const auto found =
         std::ranges::find_if(events_, [id](const auto& waiting) { return waiting.first.second == id; });
     if (found != events_.end()) {
@@ -50,7 +50,7 @@ void VirtualTime::Forget(EventId id) {
 }
 
 bool VirtualTime::CanHost(const ThreadRecord& thread) {
-    if (thread.owned.empty() && thread.sectionsHeld == 0) {
+    if (thread.owned.empty() && thread.recursiveMutexesHeld == 0) {
         return true;
     }
     // Without the thread for events, one that needs a lock of its host is reported as a deadlock; nothing
@@ -59,7 +59,7 @@ bool VirtualTime::CanHost(const ThreadRecord& thread) {
     return !hasEventThread_;
 }
 
-void VirtualTime::HostEvent(KernelHold& hold, ThreadRecord& host) {
+void VirtualTime::HostEvent(DispatcherLock& hold, ThreadRecord& host) {
     const ErrorCode errorOfHost = LastError();
     host.state = State::Hosting;
     BindCurrentThread(&hostedEvent_);
@@ -70,7 +70,7 @@ void VirtualTime::HostEvent(KernelHold& hold, ThreadRecord& host) {
 }
 
 /// Calls the first event on the stack of the calling thread, which then has the baton still.
-void VirtualTime::CallEvent(KernelHold& hold, ThreadRecord& as) {
+void VirtualTime::CallEvent(DispatcherLock& hold, ThreadRecord& as) {
     const auto first = events_.begin();
     running_ = first->first.second;
     runningAs_ = &as;
@@ -91,12 +91,12 @@ void VirtualTime::CallEvent(KernelHold& hold, ThreadRecord& as) {
 }
 
 void* VirtualTime::RunEventThread(void* time) {
-    KernelHold hold;
+    DispatcherLock hold;
     static_cast<VirtualTime*>(time)->ServeEvents(hold);
     return nullptr;
 }
 
-void VirtualTime::ServeEvents(KernelHold& hold) {
+void VirtualTime::ServeEvents(DispatcherLock& hold) {
     BindCurrentThread(&eventThread_);
     while (true) {
         hold.Wait(*eventThread_.turn, [this] { return eventThreadMustCall_ || eventThreadMustEnd_; });

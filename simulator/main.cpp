@@ -14,15 +14,15 @@
 #include <string>
 #include <vector>
 
+#include "Capture/PcapngWriter.h"
+#include "Capture/UsbCapture.h"
 #include "EepromFile.h"
 #include "FaultPlan.h"
 #include "FreshEeprom.h"
 #include "KernelPort.h"
 #include "Platform/Linux/StandardStreams.h"
-#include "Platform/Usb/PcapngWriter.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/SimulatorBus.h"
-#include "Platform/Usb/UsbCapture.h"
 #include "PollLoop.h"
 #include "ProgramOptions.h"
 #include "SimulatedInstrument.h"
@@ -90,7 +90,8 @@ void Run(const ProgramOptions& options) {
         throw std::runtime_error("more --eeprom files than instruments");
     }
     const FaultPlan faults = FaultPlan::Parse(options.faults);
-    std::optional<Usb::PcapngWriter> capture;  // made last: nothing is emptied by a start that fails
+    std::optional<Varnholt::Capture::PcapngWriter>
+        capture;  // made last: nothing is emptied by a start that fails
     std::vector<std::unique_ptr<EepromFile>> files;
     UsbIpServer server(loop, log);
     for (std::size_t i = 0; i < names.size(); ++i) {
@@ -109,7 +110,7 @@ void Run(const ProgramOptions& options) {
         if (!options.captureFile.empty()) {
             const auto number = static_cast<std::uint8_t>(i + 1);
             exported.wrap = [&capture, number](std::shared_ptr<Usb::UsbDevice> device) {
-                return Usb::CaptureDevice(std::move(device), *capture, number);
+                return Varnholt::Capture::CaptureDevice(std::move(device), *capture, number);
             };
         }
         server.Add(std::move(exported));

@@ -2,16 +2,16 @@
 
 #include <optional>
 
+#include "Capture/PcapngWriter.h"
+#include "Capture/UsbCapture.h"
 #include "Commands/Commands.h"
 #include "ExitCode.h"
 #include "Output/Json.h"
 #include "Output/Rows.h"
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFileSystem.h"
-#include "Platform/Usb/PcapngWriter.h"
 #include "Platform/Usb/SystemUsbBus.h"
 #include "Platform/Usb/UdevBus.h"
-#include "Platform/Usb/UsbCapture.h"
 #include "Session.h"
 
 namespace Varnholt::Cli {
@@ -45,8 +45,8 @@ class BusRecording final : public TrafficRecording, private Platform::Usb::UsbBu
 
     const std::string name_;
     Platform::Usb::UsbBus& bus_ = Platform::Usb::SystemUsbBus();
-    std::optional<Platform::Usb::PcapngWriter> writer_;
-    std::optional<Platform::Usb::CapturingBus> recorded_;
+    std::optional<Capture::PcapngWriter> writer_;
+    std::optional<Capture::CapturingBus> recorded_;
     const std::unique_ptr<Platform::DeviceFileSystem> files_ = Platform::Drivers::MakeDriverFileSystem(*this);
     const Platform::ScopedDeviceFiles filesInForce_{*files_};
 };

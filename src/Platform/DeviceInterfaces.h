@@ -1,28 +1,26 @@
 #pragma once
 
-#include <cstddef>
 #include <cstdint>
-#include <span>
+#include <memory>
+#include <string>
+#include <vector>
 
+#include "Platform/ErrorCodes.h"
 #include "Protocol/Guid.h"
 
 namespace Varnholt::Platform {
 
-/// A snapshot of the interfaces of one class, made by `DeviceInterfaces::MakeList`.
-using DeviceList = void*;
-
-/// Names one interface of a list. The size field is checked by the platform.
-struct InterfaceRecord {
-    std::uint32_t size = 28;
-    Protocol::Guid interfaceClass{};
-    std::uint32_t flags = 0;
-    std::uintptr_t reserved = 0;
+/// A snapshot of the interfaces of one class that are present.
+class InterfaceList {
+  public:
+    virtual ~InterfaceList() = default;
+    /// As `DeviceInterfaces::ReadPath`.
+    virtual ErrorCode ReadPath(const Protocol::Guid& interfaceClass, std::uint32_t index,
+                               std::string& path) const = 0;
 };
 
-/// Offset of the zero-terminated path in an interface detail, behind its size field; and what that field
-/// holds.
-inline constexpr std::size_t InterfaceDetailPathOffset = 4;
-inline constexpr std::uint32_t InterfaceDetailSizeField = 5;
+/// Null where no list could be made.
+using DeviceList = std::shared_ptr<const InterfaceList>;
 
 /// The platform's device-interface enumeration. On Windows this is setupapi, loaded at first use and unloaded
 /// at the end of the process; hosts that lack it are answered from the registry where `withRegistryFallback`
@@ -33,20 +31,18 @@ class DeviceInterfaces final {
     /// Loads what the other operations need; false when it cannot be had. They load it themselves.
     static bool Load();
 
-    /// Null on failure. `withRegistryFallback` lets an NT host before version 5 answer from its registry.
+    /// Null on failure, with the code in `LastError`. `withRegistryFallback` lets an NT host before version 5
+    /// answer from its registry.
     static DeviceList MakeList(const Protocol::Guid& interfaceClass, bool withRegistryFallback);
-    static bool DestroyList(DeviceList list);
 
-    /// Finds interface `index` of the list; `Errors::NoMoreItems` behind the last.
-    static bool Find(DeviceList list, const Protocol::Guid& interfaceClass, std::uint32_t index,
-                     InterfaceRecord& record);
-
-    /// Bytes that `ReadDetail` needs for this interface; 0 on failure.
-    static std::uint32_t DetailSize(DeviceList list, const InterfaceRecord& record);
-
-    /// Fills `detail` (size field set by the caller to `InterfaceDetailSizeField`) with the zero-terminated
-    /// path.
-    static bool ReadDetail(DeviceList list, const InterfaceRecord& record, std::span<std::byte> detail);
+    /// Finds the path of interface `index` of the list. `Errors::NoMoreItems` behind the last and for another
+    /// class than the list's, `Errors::NoInterfaceDetail` where the platform has no path for it, else
+    /// the platform's code.
+    static ErrorCode ReadPath(const DeviceList& list, const Protocol::Guid& interfaceClass,
+                              std::uint32_t index, std::string& path);
 };
+
+/// A list of these paths, where the platform has no enumeration of its own.
+DeviceList MakePathList(const Protocol::Guid& interfaceClass, std::vector<std::string> paths);
 
 }  // namespace Varnholt::Platform

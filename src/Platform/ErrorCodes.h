@@ -39,6 +39,8 @@ inline constexpr ErrorCode IoIncomplete = 996;
 inline constexpr ErrorCode IoPending = 997;
 inline constexpr ErrorCode DeviceNotConnected = 1167;
 inline constexpr ErrorCode NoSystemResources = 1450;
+/// The library's own: a listed interface has no path, and the system does not say why.
+inline constexpr ErrorCode NoInterfaceDetail = 0x20000001;
 }  // namespace Errors
 
 /// The calling thread's code of the last platform call that failed. Save it at once: any later call may
@@ -47,7 +49,7 @@ ErrorCode LastError();
 void SetLastError(ErrorCode code);
 
 /// The platform's message for `code`, as the platform gives it (on Windows with its line break); never empty
-/// on POSIX, empty on Windows where the system has no message.
+/// on Linux, empty on Windows where the system has no message.
 std::string ErrorText(ErrorCode code);
 
 }  // namespace Varnholt::Platform

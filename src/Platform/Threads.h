@@ -14,7 +14,7 @@ using ThreadEntry = std::uint32_t (*)(void* argument);
 Handle StartThread(ThreadEntry entry, void* argument);
 
 /// Ends a thread by force where the platform can: true when the thread will run no further instruction. A
-/// platform that cannot (POSIX) answers false at once and leaves the thread alone; the caller must then see
+/// platform that cannot (Linux) answers false at once and leaves the thread alone; the caller must then see
 /// that the thread's own waits end, and must not free what the thread still uses.
 bool EndThreadByForce(Handle thread, std::uint32_t exitCode);
 

@@ -2,9 +2,11 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <span>
 #include <string>
 
+#include "Platform/CompletionSource.h"
 #include "Platform/Handle.h"
 
 namespace Varnholt::Platform {
@@ -26,6 +28,9 @@ enum class WaitResult : std::uint32_t {
 /// Unsignalled; the wait that it satisfies resets it.
 Handle MakeAutoResetEvent();
 bool SignalEvent(Handle event);
+/// Takes a signal back. Where `source` is given, the next one comes from there: who waits for the event alone
+/// handles the source's events meanwhile. Nothing happens where it is no event.
+void ResetEvent(Handle event, const std::shared_ptr<CompletionSource>& source = nullptr);
 
 /// Not owned. Recursive: the owner must release it as often as it acquired it.
 Handle MakeMutex(const std::string& name);
@@ -47,28 +52,41 @@ WaitAnyResult WaitAny(std::span<const Handle> objects, std::uint32_t timeout);
 /// other object. `Failed` when `toSignal` cannot be signalled (then nothing was waited for).
 WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout);
 
-/// A process-local recursive lock; no handle, no time-out. It takes no memory: neither making nor entering
-/// one can fail.
-class CriticalSection final {
+/// An auto-reset event inside its owner: no handle. Neither making, signalling nor waiting takes memory.
+class EmbeddedEvent final {
   public:
-    CriticalSection();
-    ~CriticalSection();
-    CriticalSection(const CriticalSection&) = delete;
-    CriticalSection& operator=(const CriticalSection&) = delete;
+    EmbeddedEvent();
+    ~EmbeddedEvent();
+    EmbeddedEvent(const EmbeddedEvent&) = delete;
+    EmbeddedEvent& operator=(const EmbeddedEvent&) = delete;
 
-    void Enter();
-    void Leave();
+    /// As `ResetEvent`.
+    void Reset(const std::shared_ptr<CompletionSource>& source);
+    void Signal();
+    /// False after `timeout` milliseconds without a signal.
+    bool Wait(std::uint32_t timeout);
 
-    class Holder final {
-      public:
-        explicit Holder(CriticalSection& held) : section_(held) { section_.Enter(); }
-        ~Holder() { section_.Leave(); }
-        Holder(const Holder&) = delete;
-        Holder& operator=(const Holder&) = delete;
+  private:
+    struct Impl;
+    Impl& Own();
 
-      private:
-        CriticalSection& section_;
-    };
+    /// Holds the platform's `Impl`.
+    static constexpr std::size_t ImplSize = 80;
+    alignas(void*) std::byte storage_[ImplSize];
+};
+
+/// A process-local recursive lock; no handle, no time-out. It takes no memory: neither making nor locking
+/// one can fail.
+class RecursiveMutex final {
+  public:
+    RecursiveMutex();
+    ~RecursiveMutex();
+    RecursiveMutex(const RecursiveMutex&) = delete;
+    RecursiveMutex& operator=(const RecursiveMutex&) = delete;
+
+    // As the standard library names them, for its lock holders.
+    void lock();
+    void unlock();
 
   private:
     struct Impl;

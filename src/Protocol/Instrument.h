@@ -44,4 +44,8 @@ inline constexpr std::uint32_t ReadoutBytes = ReadoutValues * 2;
 /// The reset that every opening sends.
 inline constexpr std::uint16_t OpeningResetCode = 31;
 
+/// The tone at the first data of a scan.
+inline constexpr std::uint32_t BeepFrequency = 2140;  // Hz
+inline constexpr std::uint32_t BeepDuration = 75;     // ms
+
 }  // namespace Varnholt::Protocol

@@ -1,6 +1,7 @@
 #include "Service/EventWatch.h"
 
 #include <algorithm>
+#include <mutex>
 
 namespace Varnholt::Service {
 namespace {
@@ -12,17 +13,17 @@ constexpr int LooksForAGoneOne = 50;
 }  // namespace
 
 void EventWatch::Mailbox::MessageFromDevice(std::uint32_t code, std::uint32_t) {
-    const Platform::CriticalSection::Holder holder(section_);
+    const std::lock_guard holder(section_);
     waiting_.push_back({code, time_.Milliseconds()});
 }
 
 std::uint64_t EventWatch::Mailbox::Now() {
-    const Platform::CriticalSection::Holder holder(section_);
+    const std::lock_guard holder(section_);
     return time_.Milliseconds();
 }
 
 std::optional<EventWatch::Mailbox::Message> EventWatch::Mailbox::Take() {
-    const Platform::CriticalSection::Holder holder(section_);
+    const std::lock_guard holder(section_);
     if (waiting_.empty()) {
         return std::nullopt;
     }

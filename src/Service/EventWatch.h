@@ -44,7 +44,7 @@ class EventWatch final {
         std::optional<Message> Take();
 
       private:
-        Platform::CriticalSection section_;  ///< guards what follows
+        Platform::RecursiveMutex section_;  ///< guards what follows
         ElapsedTime time_;
         std::deque<Message> waiting_;
     };

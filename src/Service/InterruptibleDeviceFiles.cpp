@@ -1,6 +1,7 @@
 #include "Service/InterruptibleDeviceFiles.h"
 
 #include <algorithm>
+#include <mutex>
 #include <new>
 
 #include "Protocol/ByteOrder.h"
@@ -41,7 +42,7 @@ std::uint8_t EndpointOfNativePipe(std::uint32_t pipe) {
 InterruptibleDeviceFiles::InterruptibleDeviceFiles(DeviceFileSystem& underlying) : below_(underlying) {}
 
 void InterruptibleDeviceFiles::Interrupt() {
-    const CriticalSection::Holder holder(section_);
+    const std::lock_guard holder(section_);
     interrupted_ = true;
     std::vector<Handle> busy;
     for (const RunningTransfer& transfer : running_) {
@@ -116,7 +117,7 @@ Handle InterruptibleDeviceFiles::Open(const std::string& path) {
         return file;
     }
     try {
-        const CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         files_.push_back({file, path});
         return file;
     } catch (const std::bad_alloc&) {
@@ -128,7 +129,7 @@ Handle InterruptibleDeviceFiles::Open(const std::string& path) {
 
 bool InterruptibleDeviceFiles::CloseFile(Handle file) {
     {
-        const CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         std::erase_if(files_, [file](const OpenedFile& opened) { return opened.handle == file; });
         std::erase_if(running_, [file](const RunningTransfer& transfer) { return transfer.file == file; });
     }
@@ -148,7 +149,7 @@ bool InterruptibleDeviceFiles::Refuse(Overlapped& record, ErrorCode code) {
 /// The section is held over the start, so that no transfer slips in behind an interruption.
 template <class Start>
 bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, Start start) try {
-    const CriticalSection::Holder holder(section_);
+    const std::lock_guard holder(section_);
     if (interrupted_) {
         return Refuse(record, Errors::OperationAborted);
     }
@@ -192,7 +193,7 @@ bool InterruptibleDeviceFiles::GetResult(Handle file, Overlapped& record, std::u
         return false;
     }
     {
-        const CriticalSection::Holder holder(section_);
+        const std::lock_guard holder(section_);
         std::erase_if(running_,
                       [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
     }

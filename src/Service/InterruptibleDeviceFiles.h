@@ -66,7 +66,7 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
     Platform::DeviceFileSystem& below_;
     std::atomic<bool> interrupted_{false};
     /// Guards what follows, and keeps files from being closed while their pipes are aborted.
-    Platform::CriticalSection section_;
+    Platform::RecursiveMutex section_;
     std::vector<OpenedFile> files_;
     std::vector<RunningTransfer> running_;
 };

@@ -1,5 +1,6 @@
 #include "Service/Interruption.h"
 
+#include <mutex>
 #include <utility>
 
 #include "Service/Failure.h"
@@ -11,7 +12,7 @@ Interruption::Interruption() : event_(Platform::MakeAutoResetEvent()) {}
 void Interruption::Request() {
     requested_ = true;
     Platform::SignalEvent(event_.Get());
-    const Platform::CriticalSection::Holder holder(section_);
+    const std::lock_guard holder(section_);
     if (action_ && deferrals_ == 0) {
         action_();
     }
@@ -31,7 +32,7 @@ void Interruption::ThrowIfRequested() const {
 }
 
 void Interruption::SetAction(std::function<void()> whenRequested) {
-    const Platform::CriticalSection::Holder holder(section_);
+    const std::lock_guard holder(section_);
     action_ = std::move(whenRequested);
 }
 

@@ -1,9 +1,10 @@
 #include "UsbIo/CUsbIo.h"
 
 #include <cstdio>
-#include <cstring>
+#include <mutex>
 #include <new>
 #include <string>
+#include <utility>
 
 #include "Platform/DeviceFiles.h"
 #include "UsbIo/FailureCode.h"
@@ -36,11 +37,12 @@ Platform::DeviceList CUsbIo::CreateDeviceList(const Protocol::Guid* interfaceGui
     return nullptr;
 }
 
-bool CUsbIo::DestroyDeviceList(Platform::DeviceList list) {
-    return DeviceInterfaces::Load() && (!list || DeviceInterfaces::DestroyList(list));
+bool CUsbIo::DestroyDeviceList(Platform::DeviceList& list) {
+    list.reset();
+    return DeviceInterfaces::Load();
 }
 
-std::uint32_t CUsbIo::Open(int deviceNumber, Platform::DeviceList list,
+std::uint32_t CUsbIo::Open(int deviceNumber, const Platform::DeviceList& list,
                            const Protocol::Guid* interfaceGuid) try {
     if (IsOpen()) {
         return Status::AlreadyOpen;
@@ -48,7 +50,7 @@ std::uint32_t CUsbIo::Open(int deviceNumber, Platform::DeviceList list,
     std::string path;
     if (list) {
         if (const std::uint32_t status = ReadDetail(deviceNumber, list, interfaceGuid)) {
-            DetailData.clear();
+            DetailData.reset();
             return status;
         }
         path = GetDevicePathName();
@@ -88,7 +90,7 @@ std::uint32_t CUsbIo::OpenPath(const std::string& path) {
     return Status::Success;
 }
 
-std::uint32_t CUsbIo::ReadDetail(int deviceNumber, Platform::DeviceList list,
+std::uint32_t CUsbIo::ReadDetail(int deviceNumber, const Platform::DeviceList& list,
                                  const Protocol::Guid* interfaceGuid) {
     if (!list || !interfaceGuid) {
         return Status::InvalidFunctionParameter;
@@ -96,24 +98,19 @@ std::uint32_t CUsbIo::ReadDetail(int deviceNumber, Platform::DeviceList list,
     if (!DeviceInterfaces::Load()) {
         return Status::NoEnumeration;
     }
-    DetailData.clear();
-    Platform::InterfaceRecord record;
-    if (!DeviceInterfaces::Find(list, *interfaceGuid, static_cast<std::uint32_t>(deviceNumber), record)) {
-        const ErrorCode code = FailureCode();
-        return code == Platform::Errors::NoMoreItems ? Status::NoSuchDeviceInstance : code;
+    std::string path;
+    switch (const ErrorCode code = DeviceInterfaces::ReadPath(
+                list, *interfaceGuid, static_cast<std::uint32_t>(deviceNumber), path)) {
+        case Platform::Errors::Success:
+            DetailData = std::move(path);
+            return Status::Success;
+        case Platform::Errors::NoMoreItems:
+            return Status::NoSuchDeviceInstance;
+        case Platform::Errors::NoInterfaceDetail:
+            return Status::Failed;
+        default:
+            return code;
     }
-    const std::size_t size = DeviceInterfaces::DetailSize(list, record);
-    if (size <= Platform::InterfaceDetailPathOffset) {
-        return Status::Failed;
-    }
-    DetailData.assign(size, std::byte{0});
-    std::memcpy(DetailData.data(), &Platform::InterfaceDetailSizeField,
-                sizeof(Platform::InterfaceDetailSizeField));
-    if (!DeviceInterfaces::ReadDetail(list, record, DetailData)) {
-        return FailureCode();
-    }
-    DetailData.back() = std::byte{0};  // the path ends inside the record, whatever the platform filled in
-    return Status::Success;
 }
 
 void CUsbIo::Close() {
@@ -123,15 +120,11 @@ void CUsbIo::Close() {
     }
     controlRequest_.reset();
     controlEvent_.Reset();
-    DetailData.clear();
+    DetailData.reset();
 }
 
 const char* CUsbIo::GetDevicePathName() const {
-    if (DetailData.empty()) {
-        return nullptr;
-    }
-    const void* const path = &DetailData[Platform::InterfaceDetailPathOffset];
-    return static_cast<const char*>(path);
+    return DetailData ? DetailData->c_str() : nullptr;
 }
 
 std::uint32_t CUsbIo::IoctlSync(std::uint32_t code, const void* input, std::uint32_t inputSize, void* output,
@@ -142,7 +135,7 @@ std::uint32_t CUsbIo::IoctlSync(std::uint32_t code, const void* input, std::uint
     std::uint32_t transferred = 0;
     std::uint32_t status = Status::Success;
     {
-        Platform::CriticalSection::Holder hold(controlLock_);
+        const std::lock_guard hold(controlLock_);
         if (!controlRequest_->StartControl(FileHandle, code, input, inputSize, output, outputSize)) {
             status = FailureCode();
         }

@@ -4,7 +4,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <optional>
-#include <vector>
+#include <string>
 
 #include "Platform/DeviceInterfaces.h"
 #include "Platform/OverlappedRequest.h"
@@ -31,16 +31,17 @@ class CUsbIo {
     CUsbIo(const CUsbIo&) = delete;
     CUsbIo& operator=(const CUsbIo&) = delete;
 
-    /// The present devices that expose the interface; null on failure. To be destroyed by
-    /// `DestroyDeviceList`.
+    /// The present devices that expose the interface; null on failure.
     static Platform::DeviceList CreateDeviceList(const Protocol::Guid* interfaceGuid);
-    /// A null list only tells whether the platform's enumeration is to be had.
-    static bool DestroyDeviceList(Platform::DeviceList list);
+    /// Gives the list back, at the latest when it goes out of scope. Tells whether the platform's enumeration
+    /// is to be had.
+    static bool DestroyDeviceList(Platform::DeviceList& list);
 
     /// Opens device `deviceNumber` of the list (which may be destroyed afterwards), or the driver's device of
     /// that number without a list, and checks the driver's interface version. On failure the object is
     /// closed, unless it was open before: then `AlreadyOpen`, and the open device is left alone.
-    std::uint32_t Open(int deviceNumber, Platform::DeviceList list, const Protocol::Guid* interfaceGuid);
+    std::uint32_t Open(int deviceNumber, const Platform::DeviceList& list,
+                       const Protocol::Guid* interfaceGuid);
     /// Transfers still running on the device are ended first.
     void Close();
     bool IsOpen() const { return FileHandle != Platform::NoHandle; }
@@ -77,14 +78,14 @@ class CUsbIo {
     std::atomic<Platform::Handle> FileHandle = Platform::NoHandle;
 
   private:
-    std::uint32_t ReadDetail(int deviceNumber, Platform::DeviceList list,
+    std::uint32_t ReadDetail(int deviceNumber, const Platform::DeviceList& list,
                              const Protocol::Guid* interfaceGuid);
     std::uint32_t OpenPath(const std::string& path);
 
-    Platform::CriticalSection controlLock_;  ///< guards `controlRequest` during a device control
+    Platform::RecursiveMutex controlLock_;  ///< guards `controlRequest` during a device control
     Platform::OwnedHandle controlEvent_;
     std::optional<Platform::OverlappedRequest> controlRequest_;  ///< set while open
-    std::vector<std::byte> DetailData;  ///< interface detail record of the open device; empty without one
+    std::optional<std::string> DetailData;  ///< path of the open device, where it was opened through a list
 };
 
 }  // namespace Varnholt::UsbIo

@@ -2,19 +2,18 @@
 
 #include <cstddef>
 #include <limits>
+#include <mutex>
 #include <new>
 #include <utility>
 
 namespace Varnholt::UsbIo {
-
-using Holder = Platform::CriticalSection::Holder;
 
 CUsbIoBufferPool::~CUsbIoBufferPool() {
     Free();
 }
 
 bool CUsbIoBufferPool::Allocate(std::uint32_t sizeOfBuffer, std::uint32_t numberOfBuffers) try {
-    Holder hold(lock_);
+    const std::lock_guard hold(lock_);
     const std::uint64_t total = std::uint64_t{sizeOfBuffer} * numberOfBuffers;
     if (buffers_ || total > std::numeric_limits<std::ptrdiff_t>::max()) {
         return false;
@@ -35,7 +34,7 @@ bool CUsbIoBufferPool::Allocate(std::uint32_t sizeOfBuffer, std::uint32_t number
 }
 
 void CUsbIoBufferPool::Free() {
-    Holder hold(lock_);
+    const std::lock_guard hold(lock_);
     buffers_.reset();
     memory_.reset();
     Head = nullptr;
@@ -43,7 +42,7 @@ void CUsbIoBufferPool::Free() {
 }
 
 CUsbIoBuffer* CUsbIoBufferPool::Get() {
-    Holder hold(lock_);
+    const std::lock_guard hold(lock_);
     if (!Head) {
         return nullptr;
     }
@@ -54,7 +53,7 @@ CUsbIoBuffer* CUsbIoBufferPool::Get() {
 }
 
 void CUsbIoBufferPool::Put(CUsbIoBuffer* buffer) {
-    Holder hold(lock_);
+    const std::lock_guard hold(lock_);
     buffer->Next = Head;
     Head = buffer;
     ++currentCount_;

@@ -30,7 +30,7 @@ class CUsbIoBufferPool final {
     std::uint32_t CurrentCount() const { return currentCount_; }
 
   private:
-    Platform::CriticalSection lock_;               ///< guards all below
+    Platform::RecursiveMutex lock_;                ///< guards all below
     CUsbIoBuffer* Head = nullptr;                  ///< first free buffer
     std::atomic<std::uint32_t> currentCount_ = 0;  ///< also read without the lock
     std::unique_ptr<std::uint8_t[]> memory_;       ///< what the buffers' transfers write to: freed after them

@@ -1,13 +1,14 @@
 #include "UsbIo/CUsbIoThread.h"
 
 #include <cstring>
+#include <mutex>
 #include <utility>
 
 namespace Varnholt::UsbIo {
 
 using namespace Protocol::UsbIoDriver;
-using Platform::CriticalSection;
 using Platform::NoHandle;
+using Platform::RecursiveMutex;
 
 CUsbIoThread::~CUsbIoThread() {
     FreeBuffers();
@@ -36,7 +37,7 @@ void CUsbIoThread::OnBufferError(CUsbIoBuffer&) {}
 void CUsbIoThread::OnThreadExit() {}
 
 bool CUsbIoThread::StartThread(std::uint32_t maxErrorCount) {
-    CriticalSection::Holder hold(startLock_);
+    const std::lock_guard hold(startLock_);
     if (threadHandle_ != NoHandle) {
         return false;
     }
@@ -54,7 +55,7 @@ bool CUsbIoThread::StartThread(std::uint32_t maxErrorCount) {
 std::uint32_t CUsbIoThread::ThreadProcedure(void* self) {
     auto& thread = *static_cast<CUsbIoThread*>(self);
     // A thread that is done at once must find its handle stored, or the handle would stay behind.
-    { CriticalSection::Holder hold(thread.startLock_); }
+    { const std::lock_guard hold(thread.startLock_); }
     thread.threadId_ = std::this_thread::get_id();
     Platform::SetCurrentThreadPriority(thread.ThreadPriority);
     try {

@@ -82,8 +82,8 @@ class CUsbIoThread : public CUsbIoPipe {
 
     std::atomic<Platform::Handle> threadHandle_ = Platform::NoHandle;  ///< null while no thread runs
     std::atomic<std::thread::id> threadId_;                            ///< of the running thread
-    Platform::CriticalSection startLock_;  ///< held until the new thread's handle is stored
-    Platform::OwnedHandle stopEvent_;      ///< wakes the thread from the wait for a transfer
+    Platform::RecursiveMutex startLock_;  ///< held until the new thread's handle is stored
+    Platform::OwnedHandle stopEvent_;     ///< wakes the thread from the wait for a transfer
     // The list of the running transfers, in the order of their start; the thread's own.
     CUsbIoBuffer* firstPending_ = nullptr;
     CUsbIoBuffer* lastPending_ = nullptr;

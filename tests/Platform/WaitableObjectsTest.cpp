@@ -4,6 +4,7 @@
 #include <atomic>
 #include <deque>
 #include <functional>
+#include <mutex>
 #include <vector>
 
 #include "EachClock.h"
@@ -32,13 +33,13 @@ using Waits = EachClock;
 using Mutexes = EachClock;
 using Semaphores = EachClock;
 using SignalAndWaits = EachClock;
-using CriticalSections = EachClock;
+using RecursiveMutexes = EachClock;
 INSTANTIATE_FOR_EACH_CLOCK(Events);
 INSTANTIATE_FOR_EACH_CLOCK(Waits);
 INSTANTIATE_FOR_EACH_CLOCK(Mutexes);
 INSTANTIATE_FOR_EACH_CLOCK(Semaphores);
 INSTANTIATE_FOR_EACH_CLOCK(SignalAndWaits);
-INSTANTIATE_FOR_EACH_CLOCK(CriticalSections);
+INSTANTIATE_FOR_EACH_CLOCK(RecursiveMutexes);
 
 TEST_P(Events, KeepOneSignalForOneWait) {
     const OwnedHandle event(MakeAutoResetEvent());
@@ -368,24 +369,24 @@ TEST_P(SignalAndWaits, LoseNoSignal) {
     SignalEvent(second.Get());
 }
 
-TEST_P(CriticalSections, ExcludeThreads) {
-    CriticalSection section;
-    ExpectExclusion([&] { section.Enter(); }, [&] { section.Leave(); });
+TEST_P(RecursiveMutexes, ExcludeThreads) {
+    RecursiveMutex mutex;
+    ExpectExclusion([&] { mutex.lock(); }, [&] { mutex.unlock(); });
 }
 
-TEST_P(CriticalSections, HoldOthersUpUntilTheLastLeave) {
-    CriticalSection section;
+TEST_P(RecursiveMutexes, HoldOthersUpUntilTheLastUnlock) {
+    RecursiveMutex mutex;
     std::atomic<bool> entered = false;
-    section.Enter();
-    section.Enter();
+    mutex.lock();
+    mutex.lock();
     TestThread other([&] {
-        const CriticalSection::Holder holder(section);
+        const std::lock_guard holder(mutex);
         entered = true;
     });
-    section.Leave();
+    mutex.unlock();
     SleepMilliseconds(SettlingTime);
     EXPECT_FALSE(entered);
-    section.Leave();
+    mutex.unlock();
     other.Join();
     EXPECT_TRUE(entered);
 }

@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <chrono>
+#include <mutex>
 #include <set>
 #include <string>
 #include <thread>
@@ -39,15 +40,15 @@ TEST(VirtualTime, PassesWhileAllWait) {
 /// Three threads note their steps; which steps follow on which is the seed's choice and nobody else's.
 std::string OrderOfSteps(std::uint64_t seed) {
     VirtualClock clock(seed);
-    CriticalSection section;
+    RecursiveMutex section;
     std::string order;
     const auto body = [&](char name) {
         for (int i = 0; i < 6; ++i) {
-            const CriticalSection::Holder holder(section);
+            const std::lock_guard holder(section);
             order += name;
         }
         SleepMilliseconds(1);
-        const CriticalSection::Holder holder(section);
+        const std::lock_guard holder(section);
         order += name;
     };
     {

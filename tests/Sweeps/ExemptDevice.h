@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <mutex>
 #include <utility>
 #include <vector>
 
@@ -51,8 +52,8 @@ class ExemptDevice final : public Platform::Usb::UsbDevice {
 
 /// The virtual clock makes a thread when an event comes while a lock is held; that one is not to be counted.
 inline void StartTheClocksOwnThread() {
-    Platform::CriticalSection section;
-    const Platform::CriticalSection::Holder held(section);
+    Platform::RecursiveMutex section;
+    const std::lock_guard held(section);
     Platform::ClockScheduler().CallAt(Platform::ClockScheduler().Now() + 1, [] {});
     Platform::SleepMilliseconds(1);
 }

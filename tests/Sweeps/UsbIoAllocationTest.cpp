@@ -7,6 +7,7 @@
 #include <cstdio>
 #include <functional>
 #include <iterator>
+#include <mutex>
 #include <string>
 #include <thread>
 #include <vector>
@@ -18,7 +19,6 @@
 #include "Sweeps/FailingAllocator.h"
 #include "UsbIo/CUsbIoReader.h"
 #include "UsbIo/CUsbIoWriter.h"
-#include "UsbIo/ScopedDeviceList.h"
 #include "VirtualClock.h"
 
 namespace Varnholt::UsbIo {
@@ -41,10 +41,10 @@ struct World {
         host.Add("one");
         host.Bus().WrapDevices(
             [](const std::string&, auto opened) { return std::make_shared<Tests::ExemptDevice>(opened); });
-        const ScopedDeviceList list(InterfaceClass);
-        EXPECT_EQ(device.Open(0, list.Get(), &InterfaceClass), Status::Success);
+        const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+        EXPECT_EQ(device.Open(0, list, &InterfaceClass), Status::Success);
         EXPECT_EQ(device.SetConfiguration({0, interfaces}), Status::Success);
-        EXPECT_EQ(pipe.Bind(0, BulkInEndpoint, list.Get(), &InterfaceClass), Status::Success);
+        EXPECT_EQ(pipe.Bind(0, BulkInEndpoint, list, &InterfaceClass), Status::Success);
     }
     ~World() { EXPECT_EQ(host.Bus().Instrument("one").PendingTransfers(), 0U); }
 
@@ -82,12 +82,12 @@ std::uint32_t Open(World&) {
 
 std::uint32_t BindPipe(World& world) {
     world.pipe.Close();
-    const ScopedDeviceList list(InterfaceClass);
-    if (!list.Get()) {
+    const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+    if (!list) {
         return Status::NoMemory;
     }
     CUsbIoPipe other;
-    return other.Bind(0, BulkInEndpoint, list.Get(), &InterfaceClass);
+    return other.Bind(0, BulkInEndpoint, list, &InterfaceClass);
 }
 
 std::uint32_t Configure(World& world) {
@@ -95,8 +95,8 @@ std::uint32_t Configure(World& world) {
         const Exempt guard;
         world.pipe.Close();
         world.device.Close();  // the next configuration opens the device anew
-        const ScopedDeviceList list(InterfaceClass);
-        EXPECT_EQ(world.device.Open(0, list.Get(), &InterfaceClass), Status::Success);
+        const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+        EXPECT_EQ(world.device.Open(0, list, &InterfaceClass), Status::Success);
     }
     const std::uint32_t status = world.device.SetConfiguration({0, World::interfaces});
     return status != Status::Success ? status : world.device.UnconfigureDevice();
@@ -153,9 +153,9 @@ std::uint32_t RunStream(World& world) {
     Stream stream;
     {
         const Exempt guard;
-        const ScopedDeviceList list(InterfaceClass);
+        const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
         EXPECT_EQ(stream.Bind(0, std::is_same_v<Stream, CUsbIoReader> ? BulkInEndpoint : BulkOutEndpoint,
-                              list.Get(), &InterfaceClass),
+                              list, &InterfaceClass),
                   Status::Success);
     }
     if (!stream.AllocateBuffers(64, 3) || !stream.StartThread()) {
@@ -215,13 +215,11 @@ INSTANTIATE_TEST_SUITE_P(All, UsbIoAllocation, testing::ValuesIn(Cases),
 /// What the platform keeps of a thread that it did not start takes no memory either.
 TEST(UsbIoAllocationOfAThread, ItsFirstCallTakesNoMemory) {
     const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
-    Platform::CriticalSection section;
+    Platform::RecursiveMutex section;
     const std::array handles{event.Get(), event.Get()};
     const std::function<void()> calls[] = {
-        [&] { const Platform::CriticalSection::Holder hold(section); },
-        [&] { Platform::SignalEvent(event.Get()); },
-        [&] { Platform::WaitAny(handles, 1); },
-        [] { Platform::Close(Platform::NoHandle); },
+        [&] { const std::lock_guard hold(section); }, [&] { Platform::SignalEvent(event.Get()); },
+        [&] { Platform::WaitAny(handles, 1); },       [] { Platform::Close(Platform::NoHandle); },
         [] { Platform::SleepMilliseconds(1); },
     };
     for (const auto& call : calls) {

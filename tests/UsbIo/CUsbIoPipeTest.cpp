@@ -2,7 +2,6 @@
 #include "Protocol/Instrument.h"
 #include "Support/DriverTest.h"
 #include "UsbIo/CUsbIoPipe.h"
-#include "UsbIo/ScopedDeviceList.h"
 
 namespace Varnholt::UsbIo {
 namespace {
@@ -20,8 +19,8 @@ constexpr std::uint32_t Pending = Platform::Errors::IoPending;
 class CUsbIoPipeTest : public Tests::DriverTest {
   protected:
     void SetUp() override {
-        const ScopedDeviceList list(InterfaceClass);
-        ASSERT_EQ(pipe_.Bind(0, BulkInEndpoint, list.Get(), &InterfaceClass), Status::Success);
+        const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+        ASSERT_EQ(pipe_.Bind(0, BulkInEndpoint, list, &InterfaceClass), Status::Success);
         driver_.TakeTranscript();
     }
     /// Starts a read that fills the buffer.

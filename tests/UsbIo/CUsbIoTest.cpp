@@ -6,7 +6,6 @@
 #include "Platform/CallFilter.h"
 #include "Support/DriverTest.h"
 #include "UsbIo/CUsbIo.h"
-#include "UsbIo/ScopedDeviceList.h"
 #include "UsbIo/StatusTexts.h"
 
 namespace Varnholt::UsbIo {
@@ -65,8 +64,8 @@ class CUsbIoTest : public Tests::DriverTest {
     CUsbIoTest() : DriverTest(Tests::TestTime::RealForThreadSanitizer, {"usbio/1", "usbio/2"}) {}
 
     std::uint32_t Open(CUsbIo& device, int number = 0) {
-        const ScopedDeviceList list(InterfaceClass);
-        return device.Open(number, list.Get(), &InterfaceClass);
+        const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+        return device.Open(number, list, &InterfaceClass);
     }
 };
 
@@ -128,9 +127,8 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
         {"file refused", 0, [&] { driver_.RefuseOpen("usbio/1", 5); }, 5},
         {"no event", 1, [&] { failing("MakeAutoResetEvent", 8); }, Status::NoMemory},
         {"no enumeration", 0, [&] { failing("LoadEnumeration", 126); }, Status::NoEnumeration},
-        {"interface cannot be found", 0, [&] { failing("FindInterface", 13); }, 13},
-        {"no detail", 0, [&] { failing("DetailSize", 13); }, Status::Failed},
-        {"detail cannot be read", 0, [&] { failing("ReadDetail", 13); }, 13},
+        {"interface cannot be read", 0, [&] { failing("ReadPath", 13); }, 13},
+        {"no detail", 0, [&] { failing("ReadPath", Platform::Errors::NoInterfaceDetail); }, Status::Failed},
         {"driver refuses", 1, [&] { driver_.Script(Control::GetDriverInfo, {.code = 31, .after = 5}); }, 31},
         {"driver tells nothing", 1, [&] { driver_.Script(Control::GetDriverInfo, {}); },
          Status::VersionMismatch},
@@ -138,9 +136,9 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
     for (const Case& row : cases) {
         CUsbIo device;
         {
-            const ScopedDeviceList list(InterfaceClass);
+            const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
             row.arrange();
-            EXPECT_EQ(device.Open(row.number, list.Get(), &InterfaceClass), row.expected) << row.name;
+            EXPECT_EQ(device.Open(row.number, list, &InterfaceClass), row.expected) << row.name;
         }
         Platform::InstallCallFilter({});
         EXPECT_FALSE(device.IsOpen()) << row.name;
@@ -148,10 +146,11 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
         EXPECT_EQ(driver_.OpenFiles(), 0U) << row.name;
         EXPECT_EQ(Open(device, 1), Status::Success) << row.name;
     }
-    const ScopedDeviceList list(InterfaceClass);
-    EXPECT_EQ(CUsbIo().Open(0, list.Get(), nullptr), Status::InvalidFunctionParameter);
+    const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+    EXPECT_EQ(CUsbIo().Open(0, list, nullptr), Status::InvalidFunctionParameter);
     EXPECT_EQ(CUsbIo::CreateDeviceList(nullptr), nullptr);
-    EXPECT_TRUE(CUsbIo::DestroyDeviceList(nullptr));
+    Platform::DeviceList none;
+    EXPECT_TRUE(CUsbIo::DestroyDeviceList(none));
 }
 
 TEST_F(CUsbIoTest, SendsTheDriversRecords) {

@@ -6,7 +6,6 @@
 #include "Support/DriverTest.h"
 #include "UsbIo/CUsbIoReader.h"
 #include "UsbIo/CUsbIoWriter.h"
-#include "UsbIo/ScopedDeviceList.h"
 
 namespace Varnholt::UsbIo {
 namespace {
@@ -101,8 +100,8 @@ class CUsbIoThreadTest : public Tests::DriverTest {
   protected:
     template <class Stream>
     void Bind(Stream& stream, std::uint8_t endpoint) {
-        const ScopedDeviceList list(InterfaceClass);
-        ASSERT_EQ(stream.Bind(0, endpoint, list.Get(), &InterfaceClass), Status::Success);
+        const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+        ASSERT_EQ(stream.Bind(0, endpoint, list, &InterfaceClass), Status::Success);
         driver_.TakeTranscript();
     }
 };

@@ -1,10 +1,10 @@
 #include "Platform/Drivers/DriverFileSystem.h"
 
-#include <array>
-#include <atomic>
 #include <map>
+#include <mutex>
 #include <new>
 #include <optional>
+#include <shared_mutex>
 #include <string_view>
 #include <utility>
 
@@ -51,27 +51,27 @@ std::optional<DevicePath> Parse(std::string_view path) {
     return DevicePath{isUsbIo, std::string(name), pipe};
 }
 
-/// A handle holds the place of a file in the table and its generation, between a top bit that no handle of
-/// the system has set and two low bits that these have clear.
+/// Handles of files have the top bit set, which no handle of the system has, and the second lowest, which
+/// these have clear.
 namespace HandleLayout {
 constexpr std::uint32_t Mark = 0x80000002;
-constexpr std::uint32_t PlaceShift = 2;
-constexpr std::uint32_t PlaceBits = 10;
-constexpr std::uint32_t GenerationShift = PlaceShift + PlaceBits;
-constexpr std::uint32_t GenerationMask = (1U << OpenFile::GenerationBits) - 1;
-static_assert(GenerationShift + OpenFile::GenerationBits == 31);
-constexpr std::uint32_t Places = 1U << PlaceBits;
+constexpr std::uint32_t NumberShift = 2;
+constexpr std::uint32_t NumberMask = (1U << 29) - 1;
 }  // namespace HandleLayout
 
-Handle MakeHandle(std::uint32_t place, std::uint32_t generation) {
-    const std::uint32_t value =
-        HandleLayout::Mark | place << HandleLayout::PlaceShift | generation << HandleLayout::GenerationShift;
+/// More than any host needs: one that forgets to close files is told.
+constexpr std::size_t MostOpenFiles = 1024;
+
+Handle MakeHandle(std::uint32_t number) {
+    const std::uint32_t value = HandleLayout::Mark | (number & HandleLayout::NumberMask)
+                                                         << HandleLayout::NumberShift;
     return reinterpret_cast<Handle>(static_cast<std::uintptr_t>(value));
 }
 
 class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller {
   public:
     explicit DriverFileSystem(Usb::UsbBus& usbBus) : bus_(usbBus) {}
+    /// Closes what was left open; nobody else is in here any more.
     ~DriverFileSystem() override;
 
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
@@ -87,41 +87,31 @@ class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller
 
   private:
     /// What the open files of one instrument share. It ends with the last of them.
-    struct Instrument {
+    struct OpenDevice {
         std::weak_ptr<SharedDevice> device;
         std::weak_ptr<UsbIoDevice> usbIo;
     };
 
     std::unique_ptr<DriverFile> OpenOnDevice(const DevicePath& path, ErrorCode& error);
-    OpenFile* FreePlace();
-    OpenFile* Find(Handle file) const;
+    std::shared_ptr<OpenFile> Find(Handle file) const;
+    std::shared_ptr<OpenFile> FindBehind(Handle& file) const;
+    Handle Add(std::unique_ptr<DriverFile> driver, ErrorCode& error);
     bool Start(std::string_view call, Handle file, const Operation& operation, Overlapped& record);
-    bool Close(OpenFile& open, std::uint32_t generation);
 
     Usb::UsbBus& bus_;
-    /// Guards the instruments and the occupation of places. It is held while devices are opened and closed,
-    /// so that one which is being closed is not found in use by its own process. Taken before all other
-    /// locks.
-    CriticalSection opening_;
-    std::map<std::string, Instrument> instruments_;
-    /// A file once made stays in its place to the end, so that it can be looked up without a lock.
-    std::array<std::atomic<OpenFile*>, HandleLayout::Places> places_{};
+    /// Guards the devices. It is held while devices are opened and closed, so that one which is being closed
+    /// is not found in use by its own process. Taken before all other locks.
+    RecursiveMutex opening_;
+    std::map<std::string, OpenDevice> devices_;
+
+    mutable std::shared_mutex filesLock_;  ///< guards what follows, for a few instructions
+    std::map<Handle, std::shared_ptr<OpenFile>> files_;
+    std::uint32_t lastNumber_ = 0;
 };
 
-std::uint32_t GenerationOf(Handle file) {
-    const auto value = reinterpret_cast<std::uintptr_t>(file);
-    return static_cast<std::uint32_t>(value) >> HandleLayout::GenerationShift & HandleLayout::GenerationMask;
-}
-
-// Files that were left open are closed; nobody else is in here any more.
 DriverFileSystem::~DriverFileSystem() {
-    for (auto& place : places_) {
-        OpenFile* const file = place.load();
-        if (file == nullptr) {
-            break;
-        }
-        file->Close(file->Generation());
-        delete file;
+    for (const auto& [handle, file] : files_) {
+        file->Close();
     }
 }
 
@@ -149,14 +139,10 @@ Handle DriverFileSystem::Open(const std::string& path) {
     try {
         const std::optional<DevicePath> parsed = Parse(path);
         if (parsed) {
-            const CriticalSection::Holder holder(opening_);
-            OpenFile* const place = FreePlace();
-            error = Errors::NoSystemResources;
-            if (place != nullptr) {
-                std::unique_ptr<DriverFile> driver = OpenOnDevice(*parsed, error);
-                if (driver) {
-                    return MakeHandle(place->index, place->Open(std::move(driver)));
-                }
+            const std::lock_guard holder(opening_);
+            std::unique_ptr<DriverFile> driver = OpenOnDevice(*parsed, error);
+            if (const Handle file = driver ? Add(std::move(driver), error) : NoHandle) {
+                return file;
             }
         }
     } catch (const std::bad_alloc&) {
@@ -173,75 +159,77 @@ std::unique_ptr<DriverFile> DriverFileSystem::OpenOnDevice(const DevicePath& pat
         error = Errors::FileNotFound;
         return nullptr;
     }
-    Instrument& instrument = instruments_[path.name];
-    std::shared_ptr<SharedDevice> device = instrument.device.lock();
+    OpenDevice& open = devices_[path.name];
+    std::shared_ptr<SharedDevice> device = open.device.lock();
     if (!device || device->IsGone()) {
         // A device that was unplugged stays gone for the files that are open on it; this is another one.
         device = std::make_shared<SharedDevice>(bus_, path.name);
-        instrument = {device, {}};
+        open = {device, {}};
     }
     if (!path.isUsbIo) {
         return NativeDriverFile::Open(std::move(device), path.pipe, *this, error);
     }
-    std::shared_ptr<UsbIoDevice> usbIo = instrument.usbIo.lock();
+    std::shared_ptr<UsbIoDevice> usbIo = open.usbIo.lock();
     if (!usbIo) {
         usbIo = std::make_shared<UsbIoDevice>(std::move(device));
-        instrument.usbIo = usbIo;
+        open.usbIo = usbIo;
     }
     return std::make_unique<UsbIoDriverFile>(std::move(usbIo), *this);
 }
 
-OpenFile* DriverFileSystem::FreePlace() {
-    for (std::uint32_t index = 0; index < places_.size(); ++index) {
-        OpenFile* file = places_[index].load(std::memory_order_relaxed);
-        if (file == nullptr) {
-            file = new OpenFile(index);
-            places_[index].store(file, std::memory_order_release);
-        }
-        if (file->IsFree()) {
-            return file;
+Handle DriverFileSystem::Add(std::unique_ptr<DriverFile> driver, ErrorCode& error) {
+    const auto file = std::make_shared<OpenFile>(std::move(driver));
+    const std::lock_guard guard(filesLock_);
+    if (files_.size() >= MostOpenFiles) {
+        error = Errors::NoSystemResources;
+        return NoHandle;
+    }
+    for (;;) {
+        const Handle handle = MakeHandle(++lastNumber_);
+        if (files_.emplace(handle, file).second) {
+            return handle;
         }
     }
-    return nullptr;
 }
 
-OpenFile* DriverFileSystem::Find(Handle file) const {
-    const auto value = reinterpret_cast<std::uintptr_t>(file);
-    constexpr std::uintptr_t Fixed = ~std::uintptr_t{0x7FFFFFFF} | ((1U << HandleLayout::PlaceShift) - 1);
-    if ((value & Fixed) != HandleLayout::Mark) {
+std::shared_ptr<OpenFile> DriverFileSystem::Find(Handle file) const {
+    const std::shared_lock guard(filesLock_);
+    const auto found = files_.find(file);
+    return found != files_.end() ? found->second : nullptr;
+}
+
+/// The next file in order, whose handle `file` becomes; null behind the last.
+std::shared_ptr<OpenFile> DriverFileSystem::FindBehind(Handle& file) const {
+    const std::shared_lock guard(filesLock_);
+    const auto next = files_.upper_bound(file);
+    if (next == files_.end()) {
         return nullptr;
     }
-    return places_[value >> HandleLayout::PlaceShift & (HandleLayout::Places - 1)].load(
-        std::memory_order_acquire);
+    file = next->first;
+    return next->second;
 }
 
 bool DriverFileSystem::CloseFile(Handle file) {
     if (CallMustFail("CloseFile")) {
         return false;
     }
-    OpenFile* const open = Find(file);
-    if (open == nullptr || !Close(*open, GenerationOf(file))) {
+    const std::shared_ptr<OpenFile> open = Find(file);
+    std::unique_ptr<DriverFile> driver = open ? open->Close() : nullptr;
+    if (!driver) {
         SetLastError(Errors::InvalidHandle);
         return false;
     }
-    return true;
-}
-
-bool DriverFileSystem::Close(OpenFile& open, std::uint32_t generation) {
-    std::unique_ptr<DriverFile> driver = open.Close(generation);
-    if (!driver) {
-        return false;
-    }
-    const CriticalSection::Holder holder(opening_);
+    const std::lock_guard holder(opening_);
     driver.reset();
-    open.Free();
-    std::erase_if(instruments_, [](const auto& entry) { return entry.second.device.expired(); });
+    std::erase_if(devices_, [](const auto& entry) { return entry.second.device.expired(); });
+    const std::lock_guard guard(filesLock_);
+    files_.erase(file);
     return true;
 }
 
 bool DriverFileSystem::Start(std::string_view call, Handle file, const Operation& operation,
                              Overlapped& record) {
-    OpenFile* const open = Find(file);
+    const std::shared_ptr<OpenFile> open = Find(file);
     ErrorCode error = Errors::Success;
     if (CallMustFail(call)) {
         error = LastError();
@@ -250,7 +238,7 @@ bool DriverFileSystem::Start(std::string_view call, Handle file, const Operation
     } else if (operation.data == nullptr && operation.length > 0) {
         error = Errors::InvalidParameter;
     } else {
-        return open->Start(GenerationOf(file), operation, record);
+        return open->Start(operation, record);
     }
     MarkNotStarted(record, error);
     SetLastError(error);
@@ -280,8 +268,8 @@ bool DriverFileSystem::StartControl(Handle file, std::uint32_t code, const void*
 
 bool DriverFileSystem::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) {
     if (IsRunning(record)) {
-        OpenFile* const open = wait ? Find(file) : nullptr;
-        if (open == nullptr || !open->WaitFor(GenerationOf(file), record)) {
+        const std::shared_ptr<OpenFile> open = wait ? Find(file) : nullptr;
+        if (!open || !open->WaitFor(record)) {
             transferred = 0;
             SetLastError(Errors::IoIncomplete);
             return false;
@@ -300,21 +288,19 @@ bool DriverFileSystem::CancelTransfers(Handle file) {
     if (CallMustFail("CancelTransfers")) {
         return false;
     }
-    OpenFile* const open = Find(file);
-    if (open == nullptr || !open->CancelOwn(GenerationOf(file))) {
+    const std::shared_ptr<OpenFile> open = Find(file);
+    if (!open) {
         SetLastError(Errors::InvalidHandle);
         return false;
     }
+    open->CancelOwn();
     return true;
 }
 
 void DriverFileSystem::CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) {
-    for (const auto& place : places_) {
-        OpenFile* const file = place.load(std::memory_order_acquire);
-        if (file == nullptr) {
-            return;
-        }
-        file->CancelEndpoint(device, endpoint);
+    Handle file = NoHandle;
+    while (const std::shared_ptr<OpenFile> open = FindBehind(file)) {
+        open->CancelEndpoint(device, endpoint);
     }
 }
 

@@ -1,6 +1,6 @@
 #include "Platform/Drivers/OpenFile.h"
 
-#include <array>
+#include <algorithm>
 #include <new>
 #include <utility>
 
@@ -39,74 +39,46 @@ bool NotStarted(Overlapped& record, ErrorCode code) {
 
 void RunningRequest::TransferCompleted(Usb::Transfer&) noexcept {
     if ((state.fetch_or(Completed, std::memory_order_acq_rel) & Submitted) != 0) {
-        file.Ended(*this);
+        const std::shared_ptr<OpenFile> opened = file;  // outlives the request's end
+        opened->Finish(*this);
     }
 }
 
-OpenFile::~OpenFile() {
-    while (spare_ != nullptr) {
-        delete std::exchange(spare_, spare_->next);
+bool RunningRequest::AwaitEnd(std::uint32_t timeout) {
+    if (!ended.Wait(timeout)) {
+        return false;
     }
+    ended.Signal();  // for whoever else waits
+    return true;
 }
 
-std::uint32_t OpenFile::Open(std::unique_ptr<DriverFile> opened) {
-    const std::lock_guard guard(lock_);
-    driver_ = std::move(opened);
-    use_ = Use::Open;
-    generation_ = (generation_ + 1) & ((1U << GenerationBits) - 1);
-    return generation_;
-}
-
-std::uint32_t OpenFile::Generation() const {
-    const std::lock_guard guard(lock_);
-    return generation_;
-}
-
-bool OpenFile::IsFree() const {
-    const std::lock_guard guard(lock_);
-    return use_ == Use::Free;
-}
-
-void OpenFile::Free() {
-    const std::lock_guard guard(lock_);
-    use_ = Use::Free;
-}
-
-std::unique_ptr<DriverFile> OpenFile::Close(std::uint32_t openedAs) {
+std::unique_ptr<DriverFile> OpenFile::Close() {
     {
         const std::lock_guard guard(lock_);
-        if (use_ != Use::Open || generation_ != openedAs) {
+        if (std::exchange(closing_, true)) {
             return nullptr;
         }
-        use_ = Use::Closing;  // nothing starts from here on
     }
     Cancel([](const RunningRequest&) { return true; });
-    AwaitIdle();
-
-    RunningRequest* unused = nullptr;
-    OwnedHandle event;
-    std::unique_ptr<DriverFile> closed;
-    {
-        const std::lock_guard guard(lock_);
-        use_ = Use::Closed;
-        closed = std::move(driver_);
-        std::swap(unused, spare_);
-        event = std::move(spareEvent_);
+    for (;;) {
+        {
+            const std::lock_guard guard(lock_);
+            if (IsIdle()) {
+                return std::move(driver_);
+            }
+        }
+        idle_.Wait(Infinite);
     }
-    while (unused != nullptr) {
-        delete std::exchange(unused, unused->next);
-    }
-    return closed;
 }
 
-bool OpenFile::Start(std::uint32_t openedAs, const Operation& operation, Overlapped& record) {
+bool OpenFile::Start(const Operation& operation, Overlapped& record) {
     if (IsRunning(record)) {
         SetLastError(Errors::InvalidParameter);
         return false;
     }
-    ErrorCode error = Errors::InvalidHandle;
-    RunningRequest* const request = Begin(openedAs, record, error);
-    if (request == nullptr) {
+    ErrorCode error = Errors::Success;
+    const std::shared_ptr<RunningRequest> request = Begin(record, error);
+    if (!request) {
         return NotStarted(record, error);
     }
     const Decision decision = Decide(*driver_, operation, request->transfer);
@@ -115,12 +87,15 @@ bool OpenFile::Start(std::uint32_t openedAs, const Operation& operation, Overlap
         return NotStarted(record, decision.code);
     }
     request->endpoint.store(request->transfer.endpoint, std::memory_order_relaxed);
-    MarkRunning(record);
     if (decision.kind == Decision::Kind::Done) {
+        MarkRunning(record, nullptr);
         MarkEnded(record, Errors::Success, decision.bytes);
         Retire(*request);
         return true;
     }
+    const auto completions = driver_->Device().CompletionsOf(request->transfer.endpoint);
+    request->ended.Reset(completions);
+    MarkRunning(record, completions);
     LimitTime(*request);
     const ErrorCode refused = driver_->Device().Submit(request->transfer);
     if (refused != Errors::Success) {
@@ -128,7 +103,7 @@ bool OpenFile::Start(std::uint32_t openedAs, const Operation& operation, Overlap
         Retire(*request);
         return NotStarted(record, code);
     }
-    // Once `Submitted` is set, the request can end at any moment and is not touched any more.
+    // Once `Submitted` is set, the request can end at any moment.
     std::uint32_t before = 0;
     if (request->state.compare_exchange_strong(before, RunningRequest::Submitted,
                                                std::memory_order_acq_rel)) {
@@ -137,10 +112,7 @@ bool OpenFile::Start(std::uint32_t openedAs, const Operation& operation, Overlap
     }
     if ((before & RunningRequest::Completed) == 0) {
         CancelAfterSubmit(*request);
-        SetLastError(Errors::IoPending);
-        return false;
-    }
-    if (Finish(*request) == Errors::Success) {
+    } else if (Finish(*request) == Errors::Success) {
         return true;
     }
     // A transfer that fails at once was started all the same: its failure is the request's result.
@@ -148,36 +120,19 @@ bool OpenFile::Start(std::uint32_t openedAs, const Operation& operation, Overlap
     return false;
 }
 
-RunningRequest* OpenFile::Begin(std::uint32_t openedAs, Overlapped& record, ErrorCode& error) {
+std::shared_ptr<RunningRequest> OpenFile::Begin(Overlapped& record, ErrorCode& error) try {
+    auto request = std::make_shared<RunningRequest>(shared_from_this(), record);
     const std::lock_guard guard(lock_);
-    if (use_ != Use::Open || generation_ != openedAs) {
+    if (closing_) {
         error = Errors::InvalidHandle;
         return nullptr;
     }
-    RunningRequest* request = spare_;
-    if (request != nullptr) {
-        spare_ = request->next;
-    } else {
-        request = new (std::nothrow) RunningRequest(*this);
-        if (request == nullptr) {
-            error = Errors::NotEnoughMemory;
-            return nullptr;
-        }
-    }
-    request->record = &record;
-    request->starter = std::this_thread::get_id();
-    request->state.store(0, std::memory_order_relaxed);
-    request->endpoint.store(RunningRequest::Undecided, std::memory_order_relaxed);
-    request->waitLimit.store(0, std::memory_order_relaxed);
     request->number = ++lastNumber_;
-    request->ended = false;
-    request->previous = nullptr;
-    request->next = running_;
-    if (running_ != nullptr) {
-        running_->previous = request;
-    }
-    running_ = request;
+    running_.push_back(request);
     return request;
+} catch (const std::bad_alloc&) {
+    error = Errors::NotEnoughMemory;
+    return nullptr;
 }
 
 /// Before the transfer is submitted. A control is waited for here, anything else wherever its starter likes.
@@ -192,15 +147,18 @@ void OpenFile::LimitTime(RunningRequest& request) {
     }
     EventScheduler& scheduler = ClockScheduler();
     try {
-        request.alarm = scheduler.CallAt(scheduler.Now() + std::uint64_t{limit} * 1000,
-                                         [this, number = request.number] { GiveUp(number); });
+        // The request is there when this is called: its end forgets the alarm before anything else.
+        request.alarm = scheduler.CallAt(scheduler.Now() + std::uint64_t{limit} * 1000, [&request] {
+            const std::shared_ptr<RunningRequest> late = request.shared_from_this();
+            late->file->GiveUp(*late);
+        });
     } catch (...) {
         // No memory for the alarm: the transfer goes on without one.
     }
 }
 
-void OpenFile::GiveUp(std::uint64_t number) {
-    Cancel([number](const RunningRequest& request) { return request.number == number; },
+void OpenFile::GiveUp(const RunningRequest& request) {
+    Cancel([&request](const RunningRequest& running) { return &running == &request; },
            RunningRequest::CancelWanted | RunningRequest::TimedOut);
 }
 
@@ -208,7 +166,7 @@ void OpenFile::GiveUp(std::uint64_t number) {
 void OpenFile::CancelAfterSubmit(RunningRequest& request) {
     {
         const std::lock_guard guard(lock_);
-        Pin(request);
+        ++cancelling_;
     }
     const std::uint32_t before = request.state.fetch_or(RunningRequest::Submitted, std::memory_order_acq_rel);
     if ((before & RunningRequest::Completed) != 0) {
@@ -216,11 +174,7 @@ void OpenFile::CancelAfterSubmit(RunningRequest& request) {
     } else {
         driver_->Device().Cancel(request.transfer);
     }
-    Unpin(request);
-}
-
-void OpenFile::Ended(RunningRequest& request) {
-    Finish(request);
+    EndCancelling();
 }
 
 ErrorCode OpenFile::Finish(RunningRequest& request) {
@@ -229,10 +183,8 @@ ErrorCode OpenFile::Finish(RunningRequest& request) {
     const bool timedOut = transfer.status == Usb::TransferStatus::Cancelled &&
                           (request.state.load(std::memory_order_relaxed) & RunningRequest::TimedOut) != 0;
     const ErrorCode code = timedOut ? driver_->TimedOutCode() : driver_->OutcomeOf(transfer.status);
-    const std::uint32_t moved =
-        transfer.actualLength < transfer.length ? transfer.actualLength : transfer.length;
     // The record first: `Close` lets go of the caller's memory as soon as the request is off the list.
-    MarkEnded(*request.record, code, moved);
+    MarkEnded(request.record, code, std::min(transfer.actualLength, transfer.length));
     Retire(request);
     return code;
 }
@@ -241,190 +193,107 @@ void OpenFile::Retire(RunningRequest& request) {
     if (request.alarm != 0) {
         ClockScheduler().Forget(std::exchange(request.alarm, 0));
     }
-    Waiter* released = nullptr;
+    std::shared_ptr<RunningRequest> retired;
+    bool isIdle = false;
     {
         const std::lock_guard guard(lock_);
-        (request.previous != nullptr ? request.previous->next : running_) = request.next;
-        if (request.next != nullptr) {
-            request.next->previous = request.previous;
-        }
-        request.ended = true;
-        if (request.pins == 0) {
-            Recycle(request);
-        }
-        released = waiters_ != nullptr ? TakeReleased() : nullptr;
+        const auto place = std::ranges::find(running_, &request, &std::shared_ptr<RunningRequest>::get);
+        retired = std::move(*place);
+        running_.erase(place);
+        isIdle = closing_ && IsIdle();
     }
-    Waiter::Release(released);
-}
-
-void OpenFile::Recycle(RunningRequest& request) {
-    request.record = nullptr;
-    request.next = spare_;
-    spare_ = &request;
-}
-
-void OpenFile::Pin(RunningRequest& request) {
-    if (request.pins++ == 0) {
-        ++pinned_;
+    if (retired->isAwaited) {
+        retired->ended.Signal();
+    }
+    if (isIdle) {
+        idle_.Signal();
     }
 }
 
-void OpenFile::Unpin(RunningRequest& request) {
-    Waiter* released = nullptr;
+void OpenFile::EndCancelling() {
+    bool isIdle = false;
     {
         const std::lock_guard guard(lock_);
-        if (--request.pins == 0) {
-            --pinned_;
-            if (request.ended) {
-                Recycle(request);
-            }
-        }
-        released = waiters_ != nullptr ? TakeReleased() : nullptr;
+        --cancelling_;
+        isIdle = closing_ && IsIdle();
     }
-    Waiter::Release(released);
+    if (isIdle) {
+        idle_.Signal();
+    }
 }
 
 template <class Matches>
 void OpenFile::Cancel(Matches matches, std::uint32_t reason) {
-    struct Chosen {
-        RunningRequest* request;
-        bool submitted;
-    };
-    std::array<Chosen, 8> chosen{};
     std::uint64_t newest = 0;  // what starts meanwhile is not meant
-    for (bool isFirst = true;; isFirst = false) {
-        std::size_t count = 0;
+    {
+        const std::lock_guard guard(lock_);
+        newest = lastNumber_;
+    }
+    for (;;) {
+        std::shared_ptr<RunningRequest> chosen;
+        bool isSubmitted = false;
+        const auto isToBeCancelled = [&](const std::shared_ptr<RunningRequest>& request) {
+            if (request->number > newest || !matches(*request)) {
+                return false;
+            }
+            const std::uint32_t before = request->state.fetch_or(reason, std::memory_order_acq_rel);
+            isSubmitted = (before & RunningRequest::Submitted) != 0;
+            return (before & RunningRequest::CancelWanted) == 0;
+        };
         {
             const std::lock_guard guard(lock_);
-            newest = isFirst ? lastNumber_ : newest;
-            for (auto* request = running_; request != nullptr && count < chosen.size();
-                 request = request->next) {
-                if (request->number > newest || !matches(*request)) {
-                    continue;
-                }
-                const std::uint32_t before = request->state.fetch_or(reason, std::memory_order_acq_rel);
-                if ((before & RunningRequest::CancelWanted) == 0) {
-                    Pin(*request);
-                    chosen[count++] = {request, (before & RunningRequest::Submitted) != 0};
-                }
+            const auto found = std::ranges::find_if(running_, isToBeCancelled);
+            if (found == running_.end()) {
+                return;
             }
+            chosen = *found;
+            ++cancelling_;
         }
-        if (count == 0) {
-            return;
+        if (isSubmitted) {
+            driver_->Device().Cancel(chosen->transfer);
         }
-        for (std::size_t i = 0; i < count; ++i) {
-            if (chosen[i].submitted) {
-                driver_->Device().Cancel(chosen[i].request->transfer);
-            }
-            Unpin(*chosen[i].request);
-        }
+        EndCancelling();
     }
 }
 
-bool OpenFile::CancelOwn(std::uint32_t openedAs) {
-    {
-        const std::lock_guard guard(lock_);
-        if (use_ != Use::Open || generation_ != openedAs) {
-            return false;
-        }
-    }
+void OpenFile::CancelOwn() {
     const auto self = std::this_thread::get_id();
     Cancel([self](const RunningRequest& request) { return request.starter == self; });
-    return true;
 }
 
 void OpenFile::CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) {
-    // The file may be another's by now, hence the question at each request; where one runs there is a driver.
     Cancel([&device, endpoint, this](const RunningRequest& request) {
         return request.endpoint.load(std::memory_order_relaxed) == endpoint && &driver_->Device() == &device;
     });
 }
 
-bool OpenFile::WaitFor(std::uint32_t openedAs, const Overlapped& record) {
+bool OpenFile::WaitFor(const Overlapped& record) {
     while (IsRunning(record)) {
-        Waiter waiter;
-        Equip(waiter);
-        bool enlisted = false;
-        {
-            const std::lock_guard guard(lock_);
-            const RunningRequest* request = generation_ == openedAs ? running_ : nullptr;
-            while (request != nullptr && request->record != &record) {
-                request = request->next;
-            }
-            if (request != nullptr) {
-                waiter.request = request;
-                waiter.number = request->number;
-                if (const std::uint32_t limit = request->waitLimit.load(std::memory_order_relaxed)) {
-                    waiter.limit = limit;
-                }
-                Enlist(waiter);
-                enlisted = true;
-            }
-        }
-        if (!enlisted) {
+        const std::shared_ptr<RunningRequest> request = FindAwaited(record);
+        if (!request) {
             // Either it has just ended, or it never ran here.
             return !IsRunning(record);
         }
-        Await(waiter);
+        const std::uint32_t limit = request->waitLimit.load(std::memory_order_relaxed);
+        if (!request->AwaitEnd(limit != 0 ? limit : Infinite)) {
+            GiveUp(*request);
+            request->AwaitEnd(Infinite);
+        }
     }
     return true;
 }
 
-void OpenFile::AwaitIdle() {
-    {
-        const std::lock_guard guard(lock_);
-        if (IsIdle()) {
-            return;
-        }
-    }
-    Waiter waiter;
-    Equip(waiter);
-    {
-        const std::lock_guard guard(lock_);
-        if (IsIdle()) {
-            return;
-        }
-        Enlist(waiter);
-    }
-    Await(waiter);
-}
-
-void OpenFile::Equip(Waiter& waiter) {
-    OwnedHandle event;
-    {
-        const std::lock_guard guard(lock_);
-        std::swap(event, spareEvent_);
-    }
-    waiter.Equip(std::move(event));
-}
-
-void OpenFile::Enlist(Waiter& waiter) {
-    waiter.next = waiters_;
-    waiters_ = &waiter;
-}
-
-void OpenFile::Await(Waiter& waiter) {
-    if (!waiter.AwaitFor(waiter.limit)) {
-        GiveUp(waiter.number);
-    }
-    OwnedHandle event = waiter.Await();
+/// The request that runs on a record; its end will be signalled.
+std::shared_ptr<RunningRequest> OpenFile::FindAwaited(const Overlapped& record) {
     const std::lock_guard guard(lock_);
-    std::swap(spareEvent_, event);
-}
-
-Waiter* OpenFile::TakeReleased() {
-    Waiter* released = nullptr;
-    for (Waiter** link = &waiters_; *link != nullptr;) {
-        Waiter* const waiter = *link;
-        if (waiter->request != nullptr ? waiter->request->ended : IsIdle()) {
-            *link = waiter->next;
-            waiter->next = released;
-            released = waiter;
-        } else {
-            link = &waiter->next;
-        }
+    const auto found = std::ranges::find_if(running_, [&](const std::shared_ptr<RunningRequest>& request) {
+        return &request->record == &record;
+    });
+    if (found == running_.end()) {
+        return nullptr;
     }
-    return released;
+    (*found)->isAwaited = true;
+    return *found;
 }
 
 }  // namespace Varnholt::Platform::Drivers

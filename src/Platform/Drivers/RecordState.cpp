@@ -19,48 +19,7 @@ std::atomic_ref<std::uintptr_t> StateOf(const Overlapped& record) {
     return std::atomic_ref<std::uintptr_t>(const_cast<Overlapped&>(record).internal);
 }
 
-}  // namespace
-
-bool IsRunning(const Overlapped& record) {
-    constexpr int Yields = 64;
-    for (int round = 0;; ++round) {
-        const std::uintptr_t state = StateOf(record).load(std::memory_order_acquire);
-        if (state != Signalling) {
-            return state == Pending;
-        }
-        // Yielding alone could go on for ever if the signalling thread has a lower priority.
-        Pause(round < Yields ? 0 : 1);
-    }
-}
-
-ErrorCode OutcomeOf(const Overlapped& record, std::uint32_t& transferred) {
-    const std::uintptr_t state = StateOf(record).load(std::memory_order_acquire);
-    transferred = static_cast<std::uint32_t>(record.internalHigh);
-    return static_cast<ErrorCode>(state);
-}
-
-void MarkRunning(Overlapped& record) {
-    if (record.event != NoHandle) {
-        try {
-            Wait(record.event, 0);
-        } catch (...) {
-            // A signal from before is then taken for this request's: its waiter finds it still running.
-        }
-    }
-    record.internalHigh = 0;
-    StateOf(record).store(Pending, std::memory_order_release);
-}
-
-void MarkEnded(Overlapped& record, ErrorCode code, std::uint32_t transferred) {
-    record.internalHigh = transferred;
-    if (record.event != NoHandle) {
-        const Handle event = record.event;
-        StateOf(record).store(Signalling, std::memory_order_release);
-        SignalSurely(event);
-    }
-    StateOf(record).store(code, std::memory_order_release);
-}
-
+/// Signals an event that somebody may wait for without limit.
 void SignalSurely(Handle event) noexcept {
     // A system's driver does not signal through a call that can run out of memory or that a test can make
     // fail: the first failure may be one of these.
@@ -74,11 +33,42 @@ void SignalSurely(Handle event) noexcept {
     }
 }
 
-void Pause(std::uint32_t milliseconds) noexcept {
-    try {
-        SleepMilliseconds(milliseconds);
-    } catch (...) {
+}  // namespace
+
+bool IsRunning(const Overlapped& record) {
+    constexpr int Yields = 64;
+    for (int round = 0;; ++round) {
+        const std::uintptr_t state = StateOf(record).load(std::memory_order_acquire);
+        if (state != Signalling) {
+            return state == Pending;
+        }
+        // Yielding alone could go on for ever if the signalling thread has a lower priority.
+        SleepMilliseconds(round < Yields ? 0 : 1);
     }
+}
+
+ErrorCode OutcomeOf(const Overlapped& record, std::uint32_t& transferred) {
+    const std::uintptr_t state = StateOf(record).load(std::memory_order_acquire);
+    transferred = static_cast<std::uint32_t>(record.internalHigh);
+    return static_cast<ErrorCode>(state);
+}
+
+void MarkRunning(Overlapped& record, const std::shared_ptr<CompletionSource>& source) {
+    if (record.event != NoHandle) {
+        ResetEvent(record.event, source);
+    }
+    record.internalHigh = 0;
+    StateOf(record).store(Pending, std::memory_order_release);
+}
+
+void MarkEnded(Overlapped& record, ErrorCode code, std::uint32_t transferred) {
+    record.internalHigh = transferred;
+    if (record.event != NoHandle) {
+        const Handle event = record.event;
+        StateOf(record).store(Signalling, std::memory_order_release);
+        SignalSurely(event);
+    }
+    StateOf(record).store(code, std::memory_order_release);
 }
 
 void MarkNotStarted(Overlapped& record, ErrorCode code) {

@@ -1,7 +1,9 @@
 #pragma once
 
 #include <cstdint>
+#include <memory>
 
+#include "Platform/CompletionSource.h"
 #include "Platform/DeviceFiles.h"
 
 /// What an overlapped record says of its request. `internal` is the word that starter, completion and asker
@@ -15,17 +17,11 @@ bool IsRunning(const Overlapped& record);
 /// The outcome and bytes of a record that is not running.
 ErrorCode OutcomeOf(const Overlapped& record, std::uint32_t& transferred);
 
-/// Marks the record as running and resets its event.
-void MarkRunning(Overlapped& record);
+/// Marks the record as running and resets its event, whose next signal comes from `source` (may be null).
+void MarkRunning(Overlapped& record, const std::shared_ptr<CompletionSource>& source);
 
 /// Stores how the request ended and signals the event. The record is not touched afterwards.
 void MarkEnded(Overlapped& record, ErrorCode code, std::uint32_t transferred);
-
-/// Signals an event that somebody may wait for without limit.
-void SignalSurely(Handle event) noexcept;
-
-/// Gives other threads time; never fails.
-void Pause(std::uint32_t milliseconds) noexcept;
 
 /// The record of a request that was never started: a failure without a signal.
 void MarkNotStarted(Overlapped& record, ErrorCode code);

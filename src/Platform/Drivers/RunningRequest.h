@@ -2,18 +2,20 @@
 
 #include <atomic>
 #include <cstdint>
+#include <memory>
 #include <thread>
 
 #include "Platform/DeviceFiles.h"
 #include "Platform/EventScheduler.h"
 #include "Platform/Usb/UsbDevice.h"
+#include "Platform/WaitableObjects.h"
 
 namespace Varnholt::Platform::Drivers {
 
 class OpenFile;
 
-/// One request on an open file, from its start until its record says how it ended. Its USB transfer and the
-/// object are used again by later requests of the file.
+/// One request on an open file, from its start until its record says how it ended. Shared by the file while
+/// it runs and by whoever starts it, cancels it or waits for it.
 ///
 /// Three parties meet here: the thread that starts it, the thread that the device completes it on, and
 /// threads that cancel it. `state` decides between them:
@@ -21,22 +23,29 @@ class OpenFile;
 ///   Whoever comes second ends the request; so a completion inside `Submit` is ended by the starter, which
 ///   can then tell its caller.
 /// - a canceller sets `CancelWanted`. If that is before `Submitted`, the device does not know the transfer
-/// yet
-///   and the starter cancels it; otherwise the canceller does.
-struct RunningRequest final : public Usb::TransferClient {
+///   yet and the starter cancels it; otherwise the canceller does.
+struct RunningRequest final : public Usb::TransferClient,
+                              public std::enable_shared_from_this<RunningRequest> {
     static constexpr std::uint32_t Submitted = 1;
     static constexpr std::uint32_t Completed = 2;
     static constexpr std::uint32_t CancelWanted = 4;
     static constexpr std::uint32_t TimedOut = 8;  ///< the cancellation is the driver's own
     static constexpr std::uint16_t Undecided = 0x100;
 
-    explicit RunningRequest(OpenFile& owner) : file(owner) { transfer.client = this; }
+    RunningRequest(std::shared_ptr<OpenFile> opened, Overlapped& startedOn)
+        : file(std::move(opened)), record(startedOn) {
+        transfer.client = this;
+    }
     void TransferCompleted(Usb::Transfer& completed) noexcept override;
 
-    OpenFile& file;
+    /// False if it has not ended within `timeout` milliseconds.
+    bool AwaitEnd(std::uint32_t timeout);
+
+    const std::shared_ptr<OpenFile> file;
+    Overlapped& record;  ///< its caller's, who may reuse it when the request has ended
+    const std::thread::id starter = std::this_thread::get_id();
+    std::uint64_t number = 0;  ///< grows with each request of the file
     Usb::Transfer transfer;
-    Overlapped* record = nullptr;
-    std::thread::id starter;
     std::atomic<std::uint32_t> state{0};
     /// Where the transfer goes once that is decided; the transfer itself is not looked into meanwhile.
     std::atomic<std::uint16_t> endpoint{Undecided};
@@ -44,13 +53,8 @@ struct RunningRequest final : public Usb::TransferClient {
     std::atomic<std::uint32_t> waitLimit{0};
     /// Gives up a request that is waited for elsewhere; 0: none.
     EventScheduler::EventId alarm = 0;
-
-    // Guarded by the file's lock.
-    std::uint64_t number = 0;  ///< grows with each request of the file
-    std::uint32_t pins = 0;    ///< cancellers that may still touch the transfer
-    bool ended = false;        ///< off the list of running requests; free once nobody pins it
-    RunningRequest* next = nullptr;
-    RunningRequest* previous = nullptr;
+    bool isAwaited = false;  ///< guarded by the file's lock
+    EmbeddedEvent ended;     ///< signalled if it is awaited
 };
 
 }  // namespace Varnholt::Platform::Drivers

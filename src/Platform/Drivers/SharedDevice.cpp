@@ -1,6 +1,7 @@
 #include "Platform/Drivers/SharedDevice.h"
 
 #include <algorithm>
+#include <mutex>
 #include <new>
 #include <utility>
 
@@ -21,7 +22,7 @@ SharedDevice::SharedDevice(Usb::UsbBus& usbBus, std::string nameOnBus)
     : bus_(usbBus), name_(std::move(nameOnBus)) {}
 
 ErrorCode SharedDevice::Claim() {
-    const CriticalSection::Holder holder(setup_);
+    const std::lock_guard holder(setup_);
     if (claims_ == 0) {
         if (!opened_) {
             ErrorCode error = Errors::Success;
@@ -41,7 +42,7 @@ ErrorCode SharedDevice::Claim() {
 }
 
 void SharedDevice::Unclaim() {
-    const CriticalSection::Holder holder(setup_);
+    const std::lock_guard holder(setup_);
     if (claims_ > 0 && --claims_ == 0) {
         ClearHalts();
         opened_->Release();
@@ -49,12 +50,12 @@ void SharedDevice::Unclaim() {
 }
 
 bool SharedDevice::IsClaimed() {
-    const CriticalSection::Holder holder(setup_);
+    const std::lock_guard holder(setup_);
     return claims_ > 0;
 }
 
 ErrorCode SharedDevice::FindEndpoint(std::uint8_t endpoint, bool& found) {
-    const CriticalSection::Holder holder(setup_);
+    const std::lock_guard holder(setup_);
     found = false;
     if (!opened_) {
         return Errors::Success;
@@ -82,6 +83,10 @@ void SharedDevice::Cancel(Usb::Transfer& transfer) {
     usb_.load(std::memory_order_acquire)->Cancel(transfer);
 }
 
+std::shared_ptr<CompletionSource> SharedDevice::CompletionsOf(std::uint8_t endpoint) {
+    return usb_.load(std::memory_order_acquire)->CompletionsOf(endpoint);
+}
+
 void SharedDevice::Learn(const Usb::Transfer& transfer) {
     if (transfer.status == Usb::TransferStatus::Stalled && transfer.endpoint != 0) {
         halted_.fetch_or(BitOf(transfer.endpoint), std::memory_order_release);
@@ -92,7 +97,7 @@ void SharedDevice::Learn(const Usb::Transfer& transfer) {
 
 ErrorCode SharedDevice::ClearHalt(std::uint8_t endpoint) {
     // Whoever comes second must not pass before the first has cleared the halt, or its transfer stalls again.
-    const CriticalSection::Holder holder(setup_);
+    const std::lock_guard holder(setup_);
     return ClearHaltOf(endpoint);
 }
 

@@ -30,6 +30,8 @@ class SharedDevice final {
     /// Hands a transfer of a claimed device to it, after clearing a halt of its endpoint.
     ErrorCode Submit(Usb::Transfer& transfer);
     void Cancel(Usb::Transfer& transfer);
+    /// As `UsbDevice::CompletionsOf`, of a claimed device.
+    std::shared_ptr<CompletionSource> CompletionsOf(std::uint8_t endpoint);
     /// Remembers what the end of a transfer says about the device. Before the end is made known.
     void Learn(const Usb::Transfer& transfer);
 
@@ -46,7 +48,7 @@ class SharedDevice final {
     Usb::UsbBus& bus_;
     const std::string name_;
 
-    CriticalSection setup_;  ///< guards opening, the claim and the clearing of halts, all of which may block
+    RecursiveMutex setup_;  ///< guards opening, the claim and the clearing of halts, all of which may block
     std::uint32_t claims_ = 0;                ///< guarded by `setup`
     std::shared_ptr<Usb::UsbDevice> opened_;  ///< guarded by `setup`; once set, set for good
     std::atomic<Usb::UsbDevice*> usb_{nullptr};

@@ -1,6 +1,7 @@
 #include "Platform/Drivers/UsbIoDevice.h"
 
 #include <algorithm>
+#include <mutex>
 #include <utility>
 
 #include "Protocol/ByteOrder.h"
@@ -39,7 +40,7 @@ UsbIoDevice::~UsbIoDevice() {
 }
 
 ErrorCode UsbIoDevice::Configure(std::span<const std::uint8_t> block) {
-    const CriticalSection::Holder holder(lock_);
+    const std::lock_guard holder(lock_);
     if (device_->IsGone()) {
         return Status::DeviceRemoved;
     }
@@ -66,7 +67,7 @@ ErrorCode UsbIoDevice::Configure(std::span<const std::uint8_t> block) {
 }
 
 ErrorCode UsbIoDevice::Unconfigure() {
-    const CriticalSection::Holder holder(lock_);
+    const std::lock_guard holder(lock_);
     if (device_->IsGone()) {
         return Status::DeviceRemoved;
     }
@@ -81,7 +82,7 @@ ErrorCode UsbIoDevice::Unconfigure() {
 }
 
 ErrorCode UsbIoDevice::Bind(std::uint8_t endpoint, Binding& binding) {
-    const CriticalSection::Holder holder(lock_);
+    const std::lock_guard holder(lock_);
     if (device_->IsGone()) {
         return Status::DeviceRemoved;
     }
@@ -108,13 +109,13 @@ ErrorCode UsbIoDevice::Bind(std::uint8_t endpoint, Binding& binding) {
 }
 
 void UsbIoDevice::Unbind(Binding& binding) {
-    const CriticalSection::Holder holder(lock_);
+    const std::lock_guard holder(lock_);
     std::erase(bound_, binding.load());
     binding = 0;
 }
 
 ErrorCode UsbIoDevice::ReadParameters(Parameters& target) {
-    const CriticalSection::Holder holder(lock_);
+    const std::lock_guard holder(lock_);
     if (device_->IsGone()) {
         return Status::DeviceRemoved;
     }
@@ -123,7 +124,7 @@ ErrorCode UsbIoDevice::ReadParameters(Parameters& target) {
 }
 
 ErrorCode UsbIoDevice::WriteParameters(const Parameters& source) {
-    const CriticalSection::Holder holder(lock_);
+    const std::lock_guard holder(lock_);
     if (device_->IsGone()) {
         return Status::DeviceRemoved;
     }

@@ -50,7 +50,7 @@ class UsbIoDevice final {
   private:
     const std::shared_ptr<SharedDevice> device_;
 
-    CriticalSection lock_;  ///< guards what follows; taken before the locks of the shared device
+    RecursiveMutex lock_;  ///< guards what follows; taken before the locks of the shared device
     bool configured_ = false;
     std::vector<std::uint8_t> bound_;
     Parameters parameters_{};

@@ -8,6 +8,11 @@ WaitableObject::Taken EventObject::TryTake(ThreadRecord& /*taker*/) {
     return std::exchange(signalled_, false) ? Taken::Yes : Taken::No;
 }
 
+void EventObject::Reset(const std::shared_ptr<CompletionSource>& source) {
+    signalled_ = false;
+    source_ = source;
+}
+
 ErrorCode EventObject::Signal(ThreadRecord& /*signaller*/) {
     signalled_ = true;
     OfferToWaiters();

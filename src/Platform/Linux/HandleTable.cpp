@@ -1,6 +1,6 @@
 #include "Platform/Linux/HandleTable.h"
 
-#include "Platform/Linux/Immortal.h"
+#include "Platform/Linux/NoDestructor.h"
 
 namespace Varnholt::Platform {
 namespace Linux {
@@ -17,13 +17,13 @@ std::uintptr_t Value(Handle handle) {
 }  // namespace
 
 HandleTable& HandleTable::Instance() {
-    static Immortal<HandleTable> table;
+    static NoDestructor<HandleTable> table;
     return *table;
 }
 
 Handle HandleTable::Add(ObjectRef object) {
     {
-        const KernelHold hold;
+        const DispatcherLock hold;
         ++object->handles_;
     }
     const std::unique_lock held(lock_);
@@ -61,7 +61,7 @@ bool HandleTable::Close(Handle handle) {
         return false;
     }
     ThreadRecord& me = CurrentThread();
-    const KernelHold hold;
+    const DispatcherLock hold;
     if (--object->handles_ == 0) {
         object->LastHandleClosed(me);
     }

@@ -1,10 +1,9 @@
-#include "Platform/HostQueries.h"
-
 #include <sys/utsname.h>
 
 #include <cstdio>
 #include <string_view>
-#include <utility>
+
+#include "Platform/SystemAnswers.h"
 
 namespace Varnholt::Platform {
 namespace {
@@ -12,21 +11,6 @@ namespace {
 /// None of the Windows families (0 to 2). An NT-family record with a kernel's version in it would be taken
 /// for a Windows that it is not: 6.1 is "XP" there.
 constexpr std::uint32_t NoWindows = 3;
-
-std::optional<VersionRecord> versionOverride;
-std::optional<bool> hostOverride;
-
-VersionRecord ReadKernelVersion() {
-    VersionRecord record;
-    record.platformId = NoWindows;
-    utsname host{};
-    if (uname(&host) == 0) {
-        // A release has the form 6.1.0-13-amd64; what is missing stays 0.
-        std::sscanf(host.release, "%9u.%9u.%9u", &record.major, &record.minor, &record.build);
-        record.servicePack = std::string(host.sysname) + " " + host.release;
-    }
-    return record;
-}
 
 /// There is no 32-bit layer to ask about; what counts is the machine that the kernel reports.
 bool AskForMachine(int& flag) {
@@ -41,24 +25,20 @@ bool AskForMachine(int& flag) {
 
 }  // namespace
 
-VersionRecord ReadVersionRecord() {
-    return versionOverride ? *versionOverride : ReadKernelVersion();
+VersionRecord ReadSystemVersion() {
+    VersionRecord record;
+    record.platformId = NoWindows;
+    utsname host{};
+    if (uname(&host) == 0) {
+        // A release has the form 6.1.0-13-amd64; what is missing stays 0.
+        std::sscanf(host.release, "%9u.%9u.%9u", &record.major, &record.minor, &record.build);
+        record.servicePack = std::string(host.sysname) + " " + host.release;
+    }
+    return record;
 }
 
 Is64BitHostQuery LookUp64BitHostQuery() {
     return AskForMachine;
-}
-
-void OverrideVersionRecord(std::optional<VersionRecord> record) {
-    versionOverride = std::move(record);
-}
-
-void Override64BitHost(std::optional<bool> answer) {
-    hostOverride = answer;
-}
-
-std::optional<bool> Overridden64BitHost() {
-    return hostOverride;
 }
 
 }  // namespace Varnholt::Platform

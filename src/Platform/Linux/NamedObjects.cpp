@@ -3,7 +3,7 @@
 #include <map>
 #include <mutex>
 
-#include "Platform/Linux/Immortal.h"
+#include "Platform/Linux/NoDestructor.h"
 #include "Platform/Linux/SharedMutex.h"
 #include "Platform/Linux/SharedSemaphore.h"
 
@@ -34,21 +34,21 @@ class OpenObjects final {
     std::map<std::string, std::weak_ptr<Object>> objects_;  // guarded by `lock`
 };
 
-Immortal<OpenObjects<MutexObject>> openMutexes;
-Immortal<OpenObjects<SemaphoreObject>> openSemaphores;
+NoDestructor<OpenObjects<MutexObject>> openMutexes;
+NoDestructor<OpenObjects<SemaphoreObject>> openSemaphores;
 
 }  // namespace
 
 std::shared_ptr<MutexObject> OpenNamedMutex(const std::string& name) {
     return (*openMutexes).Open(name, [&name] {
-        return CurrentClock().TakesTurns() ? std::make_shared<MutexObject>() : OpenSharedMutex(name);
+        return CurrentClock().IsCooperative() ? std::make_shared<MutexObject>() : OpenSharedMutex(name);
     });
 }
 
 std::shared_ptr<SemaphoreObject> OpenNamedSemaphore(std::int32_t initialCount, std::int32_t maximumCount,
                                                     const std::string& name) {
     return (*openSemaphores).Open(name, [&]() -> std::shared_ptr<SemaphoreObject> {
-        if (CurrentClock().TakesTurns()) {
+        if (CurrentClock().IsCooperative()) {
             return std::make_shared<LocalSemaphore>(initialCount, maximumCount);
         }
         return OpenSharedSemaphore(initialCount, maximumCount, name);

@@ -5,8 +5,8 @@
 #include <algorithm>
 #include <chrono>
 
-#include "Platform/Linux/Immortal.h"
-#include "Platform/Linux/Kernel.h"
+#include "Platform/Linux/Dispatcher.h"
+#include "Platform/Linux/NoDestructor.h"
 #include "Platform/Linux/RealScheduler.h"
 #include "Platform/Linux/WaitableObject.h"
 
@@ -22,7 +22,7 @@ constexpr Microseconds LongestAwait = 50'000;
 }  // namespace
 
 RealClock& RealClock::Instance() {
-    static Immortal<RealClock> clock;
+    static NoDestructor<RealClock> clock;
     return *clock;
 }
 
@@ -41,22 +41,21 @@ EventScheduler& RealClock::Scheduler() {
     return RealScheduler::Instance();
 }
 
-/// False when there is nothing that the thread can work off.
-bool RealClock::WorkOff(KernelHold& hold, BlockedCall& call, Microseconds deadline) {
-    auto source = call.mayWorkOff ? call.thread.source.lock() : nullptr;
-    if (!source || !source->TryEnter()) {
+/// False when there are no events for the thread to handle.
+bool RealClock::HandleEvents(DispatcherLock& hold, BlockedCall& call, Microseconds deadline) {
+    if (!call.source || !call.source->TryBegin()) {
         return false;
     }
-    call.worksOff = source;
+    call.handlesEvents = true;
     hold.unlock();
-    source->WorkOff(deadline);
+    call.source->HandleEvents(deadline);
     hold.lock();
-    call.worksOff = nullptr;
+    call.handlesEvents = false;
     return true;
 }
 
-void RealClock::Block(KernelHold& hold, BlockedCall& call, Microseconds deadline) {
-    while (!call.woken && Now() < deadline && WorkOff(hold, call, deadline)) {
+void RealClock::Block(DispatcherLock& hold, BlockedCall& call, Microseconds deadline) {
+    while (!call.woken && Now() < deadline && HandleEvents(hold, call, deadline)) {
     }
     const auto woken = [&call] { return call.woken; };
     if (deadline == Never) {
@@ -69,14 +68,14 @@ void RealClock::Block(KernelHold& hold, BlockedCall& call, Microseconds deadline
 
 void RealClock::Wake(BlockedCall& call) {
     call.woken = true;
-    if (!call.worksOff) {
-        KernelHold::RingOnRelease(call.thread.turn);
+    if (!call.handlesEvents) {
+        DispatcherLock::NotifyOnRelease(call.thread.turn);
     } else if (!IsCurrentThread(call.thread)) {
-        KernelHold::InterruptOnRelease(call.worksOff);
+        DispatcherLock::InterruptOnRelease(call.source);
     }
 }
 
-void RealClock::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microseconds deadline,
+void RealClock::BlockOnOtherProcess(DispatcherLock& hold, BlockedCall& call, Microseconds deadline,
                                     Microseconds period, WaitableObject* only, std::uint32_t seen) {
     const Microseconds now = Now();
     if (only && deadline > now) {
@@ -88,7 +87,7 @@ void RealClock::BlockOnOtherProcess(KernelHold& hold, BlockedCall& call, Microse
     }
 }
 
-void RealClock::GiveUpSlice(KernelHold& hold) {
+void RealClock::GiveUpSlice(DispatcherLock& hold) {
     hold.unlock();
     sched_yield();
     hold.lock();

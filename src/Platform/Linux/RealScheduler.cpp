@@ -1,6 +1,5 @@
 #include "Platform/Linux/RealScheduler.h"
 
-#include <sched.h>
 #include <sys/prctl.h>
 
 #include <algorithm>
@@ -15,13 +14,6 @@ namespace {
 
 constexpr Microseconds LongestStep = 3'600'000'000;
 
-/// How long after a waiting thread has called an event the own thread leaves events to the next wait.
-constexpr Microseconds Patience = 2'000;
-
-/// The system ends a sleep up to this much late. A thread that waits for what an event does spends the rest
-/// awake: it is the one that is in a hurry.
-constexpr Microseconds SleepSlack = 100;
-
 std::chrono::steady_clock::time_point At(Microseconds time) {
     return std::chrono::steady_clock::time_point(std::chrono::microseconds(time));
 }
@@ -34,8 +26,8 @@ EventScheduler::EventId NewEventId() {
 }
 
 RealScheduler& RealScheduler::Instance() {
-    static const auto scheduler = std::make_shared<RealScheduler>();
-    return *scheduler;
+    static RealScheduler scheduler;
+    return scheduler;
 }
 
 RealScheduler::~RealScheduler() {
@@ -59,14 +51,9 @@ EventScheduler::EventId RealScheduler::CallAt(std::uint64_t time, std::function<
         StartThread();
     }
     if (place == events_.begin()) {
-        (waiterEntered_ ? waitersTurn_ : threadsTurn_).notify_one();
+        changed_.notify_one();
     }
     callEnded_.notify_all();  // the end of the thread is not to be waited for any more
-    const bool isAnEventsOwn = running_ != 0 && runner_ == std::this_thread::get_id();
-    hold.unlock();
-    if (!isAnEventsOwn) {
-        WorkOffInWaits(weak_from_this());
-    }
     return id;
 }
 
@@ -109,13 +96,10 @@ void RealScheduler::CallEvents() {
     Hold hold(lock_);
     while (!events_.empty()) {
         const Microseconds now = Now();
-        Microseconds time = std::max(events_.begin()->first.first, leftToWaiters_);
-        if (waiterEntered_) {
-            time = std::max(time, now + Patience);
-        }
+        const Microseconds time = events_.begin()->first.first;
         if (time > now) {
             // A time so far off that the system's clock could not hold it is approached in steps.
-            threadsTurn_.wait_until(hold, At(std::min(time, now + LongestStep)));
+            changed_.wait_until(hold, At(std::min(time, now + LongestStep)));
         } else {
             CallNext(hold);
         }
@@ -136,51 +120,6 @@ void RealScheduler::CallNext(Hold& hold) {
     hold.lock();
     running_ = 0;
     callEnded_.notify_all();
-    if (events_.empty()) {
-        threadsTurn_.notify_one();
-    }
-}
-
-bool RealScheduler::TryEnter() {
-    const Hold hold(lock_);
-    if (waiterEntered_ || running_ != 0 || events_.empty()) {
-        return false;
-    }
-    waiterEntered_ = true;
-    interrupted_ = false;
-    return true;
-}
-
-void RealScheduler::WorkOff(Microseconds deadline) {
-    Hold hold(lock_);
-    while (!interrupted_ && !events_.empty()) {
-        const Microseconds now = Now();
-        const Microseconds time = events_.begin()->first.first;
-        if (now >= time) {
-            CallNext(hold);
-            break;
-        }
-        if (now >= deadline) {
-            break;
-        }
-        const Microseconds end = std::min({time, deadline, now + LongestStep});
-        if (end - now > SleepSlack) {
-            waitersTurn_.wait_until(hold, At(end - SleepSlack));
-        } else {
-            hold.unlock();
-            sched_yield();
-            hold.lock();
-        }
-    }
-    waiterEntered_ = false;
-    leftToWaiters_ = Now() + Patience;
-    hold.unlock();
-}
-
-void RealScheduler::Interrupt() {
-    const Hold hold(lock_);
-    interrupted_ = true;
-    waitersTurn_.notify_one();
 }
 
 void RealScheduler::JoinEndedThread(Hold& hold) {
@@ -195,7 +134,7 @@ void RealScheduler::JoinEndedThread(Hold& hold) {
 }
 
 void RealScheduler::WaitForEnd(Hold& hold) {
-    threadsTurn_.notify_one();
+    changed_.notify_one();
     callEnded_.wait(hold, [this] { return threadState_ != ThreadState::Running || !events_.empty(); });
     JoinEndedThread(hold);
 }

@@ -4,23 +4,20 @@
 
 #include <condition_variable>
 #include <map>
-#include <memory>
 #include <mutex>
 #include <thread>
 #include <utility>
 
-#include "Platform/Linux/CompletionSource.h"
+#include "Platform/EventScheduler.h"
+#include "Platform/Linux/Clock.h"
 
 namespace Varnholt::Platform::Linux {
 
 /// Names events across all schedulers, so that an event of one is never taken for an event of another.
 EventScheduler::EventId NewEventId();
 
-/// Events in real time, called on a thread that exists while events wait, or on one that waits for what they
-/// do.
-class RealScheduler final : public EventScheduler,
-                            public CompletionSource,
-                            public std::enable_shared_from_this<RealScheduler> {
+/// Events in real time, called on a thread that exists while events wait.
+class RealScheduler final : public EventScheduler {
   public:
     static RealScheduler& Instance();
 
@@ -33,10 +30,6 @@ class RealScheduler final : public EventScheduler,
     std::uint64_t Now() override;
     EventId CallAt(std::uint64_t time, std::function<void()> event) override;
     void Forget(EventId id) override;
-
-    bool TryEnter() override;
-    void WorkOff(Microseconds deadline) override;
-    void Interrupt() override;
 
   private:
     using Hold = std::unique_lock<std::mutex>;
@@ -52,13 +45,9 @@ class RealScheduler final : public EventScheduler,
     EventId running_ = 0;
     std::thread::id runner_;             // of the event that is running
     std::condition_variable callEnded_;  // an event's, or the thread's
-    std::condition_variable threadsTurn_;
-    std::condition_variable waitersTurn_;
+    std::condition_variable changed_;    // for the thread
     enum class ThreadState { None, Running, Ended } threadState_ = ThreadState::None;
     pthread_t thread_{};
-    bool waiterEntered_ = false;
-    bool interrupted_ = false;
-    Microseconds leftToWaiters_ = 0;  // the thread sleeps until then
 };
 
 }  // namespace Varnholt::Platform::Linux

@@ -31,7 +31,7 @@ class ThreadObject final : public WaitableObject {
   private:
     void JoinOnce();
 
-    bool ended_ = false;  // guarded by the kernel lock
+    bool ended_ = false;  // guarded by the dispatcher lock
     std::atomic<bool> joined_ = true;
 };
 

@@ -26,13 +26,13 @@ void* RunThread(void* argument) {
     ThreadRecord& record = *start->record;
     BindCurrentThread(&record);
     {
-        KernelHold hold;
+        DispatcherLock hold;
         CurrentClock().ThreadBegins(hold, record);
     }
     start->entry(start->argument);
     AbandonOwned(record);
     {
-        KernelHold hold;
+        DispatcherLock hold;
         start->object->End();
         CurrentClock().ThreadEnds(hold, record);
     }
@@ -56,14 +56,14 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
     object->number = record.number;
     OwnedHandle handle(HandleTable::Instance().Add(object));
     {
-        KernelHold hold;
+        DispatcherLock hold;
         CurrentClock().ThreadMade(hold, record);
     }
     object->MustBeJoined(true);
     if (!StartSystemThread(object->thread, RunThread, start.get())) {
         object->MustBeJoined(false);
         {
-            KernelHold hold;
+            DispatcherLock hold;
             CurrentClock().ThreadNeverBegan(hold, record);
         }
         handle.Reset();
@@ -71,7 +71,7 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
         return NoHandle;
     }
     static_cast<void>(start.release());  // the thread's now
-    KernelHold hold;
+    DispatcherLock hold;
     CurrentClock().Preempt(hold);
     return handle.Release();
 }
@@ -123,7 +123,7 @@ bool SetCurrentThreadPriority(int level) {
 }
 
 void SleepMilliseconds(std::uint32_t milliseconds) {
-    KernelHold hold;
+    DispatcherLock hold;
     if (milliseconds == 0) {
         CurrentClock().GiveUpSlice(hold);
         return;

@@ -1,18 +1,14 @@
 #include "Platform/Time.h"
 
 #include <ctime>
-#include <mutex>
-#include <utility>
 
 #include "Platform/Linux/Clock.h"
+#include "Platform/SystemAnswers.h"
 
 namespace Varnholt::Platform {
 namespace {
 
 constexpr std::uint64_t CountsPerSecond = 1'000'000;
-
-std::mutex observerLock;
-BeepObserver beepObserver;  // guarded by observerLock
 
 }  // namespace
 
@@ -41,20 +37,6 @@ CalendarTime LocalCalendarTime(std::int64_t seconds) {
     return {local.tm_year + 1900, local.tm_mon + 1, local.tm_mday, local.tm_hour, local.tm_min, local.tm_sec};
 }
 
-void Beep(std::uint32_t hertz, std::uint32_t milliseconds) {
-    BeepObserver observer;
-    {
-        const std::lock_guard held(observerLock);
-        observer = beepObserver;
-    }
-    if (observer) {
-        observer(hertz, milliseconds);
-    }
-}
-
-void ObserveBeeps(BeepObserver observer) {
-    const std::lock_guard held(observerLock);
-    beepObserver = std::move(observer);
-}
+void SoundSystemBeep(std::uint32_t /*hertz*/, std::uint32_t /*milliseconds*/) {}
 
 }  // namespace Varnholt::Platform

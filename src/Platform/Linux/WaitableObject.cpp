@@ -19,7 +19,9 @@ class Waiter final : public BlockedCall {
             entry.waiter = this;
             entry.object->Enqueue(entry);
         }
-        mayWorkOff = entries_.size() == 1;  // who listens to several things waits for long, and is not urgent
+        if (entries_.size() == 1) {  // who listens to several things waits for long, and is not urgent
+            source = entries_[0].object->SignalledBy();
+        }
     }
     ~Waiter() {
         for (WaitEntry& entry : entries_) {
@@ -91,7 +93,7 @@ void WaitableObject::OfferToWaiters() {
     }
 }
 
-WaitAnyResult WaitForAny(KernelHold& hold, std::span<WaitEntry> entries, Microseconds deadline) {
+WaitAnyResult WaitForAny(DispatcherLock& hold, std::span<WaitEntry> entries, Microseconds deadline) {
     Waiter waiter(CurrentThread(), entries);
     Clock& clock = CurrentClock();
     WaitableObject* const only = entries.size() == 1 ? entries[0].object.get() : nullptr;

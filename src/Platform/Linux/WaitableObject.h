@@ -7,7 +7,7 @@
 #include <string>
 
 #include "Platform/ErrorCodes.h"
-#include "Platform/Linux/Kernel.h"
+#include "Platform/Linux/Dispatcher.h"
 #include "Platform/WaitableObjects.h"
 
 namespace Varnholt::Platform::Linux {
@@ -26,7 +26,7 @@ struct WaitEntry {
     WaitEntry* next = nullptr;
 };
 
-/// Something a thread can wait for. All operations with the kernel lock held unless they say otherwise.
+/// Something a thread can wait for. All operations with the dispatcher lock held unless they say otherwise.
 ///
 /// What an object has to give is handed to the threads that wait for it, first come first served, by the
 /// thread that makes it available: two signals in a row end two waits, however late the waiting threads run.
@@ -46,12 +46,14 @@ class WaitableObject {
     /// False when `taker` must be the calling thread; who waits is then woken to take the object himself.
     virtual bool CanBeTakenForOthers() const { return true; }
     /// True when another process may have to make the object available. `Changes` then counts what may have
-    /// made it so, and `AwaitChange`, without the kernel lock, returns soon after it has passed `seen`, and
-    /// after `limit` at the latest.
+    /// made it so, and `AwaitChange`, without the dispatcher lock, returns soon after it has passed `seen`,
+    /// and after `limit` at the latest.
     virtual bool IsHeldElsewhere() const { return false; }
     virtual std::uint32_t Changes() const { return 0; }
     virtual void AwaitChange(std::uint32_t /*seen*/, Microseconds /*limit*/) {}
-    /// After a wait of the caller has taken the object, without the kernel lock.
+    /// Where its signal comes from, when that is a transfer's end.
+    virtual std::shared_ptr<CompletionSource> SignalledBy() const { return nullptr; }
+    /// After a wait of the caller has taken the object, without the dispatcher lock.
     virtual void AfterWait() {}
     /// The last handle is closed by `closer`.
     virtual void LastHandleClosed(ThreadRecord& /*closer*/) {}
@@ -70,8 +72,8 @@ class WaitableObject {
     std::size_t handles_ = 0;
 };
 
-/// Waits until the object of one of `entries` could be taken for the calling thread. With the kernel lock
+/// Waits until the object of one of `entries` could be taken for the calling thread. With the dispatcher lock
 /// held; lets go of it while blocked.
-WaitAnyResult WaitForAny(KernelHold& hold, std::span<WaitEntry> entries, Microseconds deadline);
+WaitAnyResult WaitForAny(DispatcherLock& hold, std::span<WaitEntry> entries, Microseconds deadline);
 
 }  // namespace Varnholt::Platform::Linux

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <new>
 
 #include "Platform/CallFilter.h"
 #include "Platform/Linux/EventObject.h"
@@ -29,14 +30,14 @@ Handle AddIfMade(ObjectRef object) {
     return object ? HandleTable::Instance().Add(std::move(object)) : NoHandle;
 }
 
-/// Runs `action` on the object with the kernel lock held, where another thread may go first and last.
+/// Runs `action` on the object with the dispatcher lock held, where another thread may go first and last.
 template <typename Kind, typename Action>
 bool OnObject(Handle handle, Action action) {
     const auto object = HandleTable::Instance().FindAs<Kind>(handle);
     if (!object) {
         return false;
     }
-    KernelHold hold;
+    DispatcherLock hold;
     CurrentClock().Preempt(hold);
     const ErrorCode code = action(*object);
     CurrentClock().Preempt(hold);
@@ -48,7 +49,7 @@ WaitAnyResult WaitForObjects(std::span<WaitEntry> entries, std::uint32_t timeout
     const Microseconds deadline = DeadlineAfter(timeout);
     WaitAnyResult outcome{};
     {
-        KernelHold hold;
+        DispatcherLock hold;
         CurrentClock().Preempt(hold);
         outcome = WaitForAny(hold, entries, deadline);
     }
@@ -73,6 +74,13 @@ Handle MakeAutoResetEvent() {
 bool SignalEvent(Handle event) {
     return !CallMustFail("SignalEvent") &&
            OnObject<EventObject>(event, [](EventObject& object) { return object.Signal(CurrentThread()); });
+}
+
+void ResetEvent(Handle event, const std::shared_ptr<CompletionSource>& source) {
+    OnObject<EventObject>(event, [&](EventObject& object) {
+        object.Reset(source);
+        return Errors::Success;
+    });
 }
 
 Handle MakeMutex(const std::string& name) {
@@ -146,7 +154,7 @@ WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) 
     const Microseconds deadline = DeadlineAfter(timeout);
     WaitResult result{};
     {
-        KernelHold hold;
+        DispatcherLock hold;
         CurrentClock().Preempt(hold);
         if (!Succeeded(signalled->Signal(CurrentThread()))) {
             return WaitResult::Failed;
@@ -157,6 +165,40 @@ WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) 
         entries[0].object->AfterWait();
     }
     return result;
+}
+
+struct EmbeddedEvent::Impl {
+    EventObject object;
+};
+
+EmbeddedEvent::EmbeddedEvent() {
+    static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
+    std::construct_at(reinterpret_cast<Impl*>(storage_));
+}
+
+EmbeddedEvent::~EmbeddedEvent() {
+    std::destroy_at(&Own());
+}
+
+EmbeddedEvent::Impl& EmbeddedEvent::Own() {
+    return *std::launder(reinterpret_cast<Impl*>(storage_));
+}
+
+void EmbeddedEvent::Reset(const std::shared_ptr<CompletionSource>& source) {
+    const DispatcherLock hold;
+    Own().object.Reset(source);
+}
+
+void EmbeddedEvent::Signal() {
+    DispatcherLock hold;
+    Own().object.Signal(CurrentThread());
+    CurrentClock().Preempt(hold);
+}
+
+bool EmbeddedEvent::Wait(std::uint32_t timeout) {
+    // Its owner keeps it alive, so the reference counts nothing.
+    std::array entries{WaitEntry{ObjectRef(ObjectRef(), &Own().object)}};
+    return WaitForObjects(entries, timeout).result == WaitResult::Signalled;
 }
 
 }  // namespace Varnholt::Platform

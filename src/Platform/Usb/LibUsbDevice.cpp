@@ -73,6 +73,10 @@ class LibUsbDevice final : public UsbDevice {
     ErrorCode ClearHalt(std::uint8_t endpoint) override {
         return ErrorFromLibUsb(libusb_clear_halt(handle_, endpoint));
     }
+    std::shared_ptr<CompletionSource> CompletionsOf(std::uint8_t endpoint) override {
+        return endpoint != Protocol::InterruptInEndpoint ? events_
+                                                         : nullptr;  // that one is waited for at leisure
+    }
 
   private:
     static void LIBUSB_CALL Completed(libusb_transfer* transfer);
@@ -191,9 +195,6 @@ ErrorCode LibUsbDevice::Submit(Transfer& transfer) {
         }
     }
 
-    if (transfer.endpoint != Protocol::InterruptInEndpoint) {  // waited for at leisure
-        Linux::WorkOffInWaits(events_);
-    }
     const std::lock_guard lock(mutex_);
     running_.reserve(running_.size() + 1);
     spare_.reserve(spare_.size() + running_.size() + 1);

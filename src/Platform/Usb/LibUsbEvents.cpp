@@ -4,6 +4,7 @@
 
 #include <algorithm>
 
+#include "Platform/EventScheduler.h"
 #include "Platform/Linux/HostSignalsBlocked.h"
 
 namespace Varnholt::Platform::Usb {
@@ -74,7 +75,7 @@ void LibUsbEvents::Stop() {
     thread_.join();
 }
 
-bool LibUsbEvents::TryEnter() {
+bool LibUsbEvents::TryBegin() {
     const std::lock_guard lock(mutex_);
     if (waiterHandles_ || handlesAlways_ || stopping_) {
         return false;
@@ -84,10 +85,10 @@ bool LibUsbEvents::TryEnter() {
     return true;
 }
 
-void LibUsbEvents::WorkOff(Linux::Microseconds deadline) {
-    const Linux::Microseconds now = Linux::CurrentClock().Now();
-    const auto longest = static_cast<Linux::Microseconds>(std::chrono::microseconds(LongestStay).count());
-    const Linux::Microseconds stay = std::min(deadline > now ? deadline - now : 0, longest);
+void LibUsbEvents::HandleEvents(std::uint64_t deadline) {
+    const std::uint64_t now = ClockScheduler().Now();
+    const auto longest = static_cast<std::uint64_t>(std::chrono::microseconds(LongestStay).count());
+    const std::uint64_t stay = std::min(deadline > now ? deadline - now : 0, longest);
     timeval time{};
     time.tv_sec = static_cast<time_t>(stay / 1'000'000);
     time.tv_usec = static_cast<suseconds_t>(stay % 1'000'000);

@@ -5,7 +5,7 @@
 #include <mutex>
 #include <thread>
 
-#include "Platform/Linux/CompletionSource.h"
+#include "Platform/CompletionSource.h"
 
 struct libusb_context;
 
@@ -13,7 +13,7 @@ namespace Varnholt::Platform::Usb {
 
 /// Handles the events of one libusb context: on a thread of its own, or on one that waits for a transfer.
 /// Only this object handles them, so that nobody else takes libusb's lock of events.
-class LibUsbEvents final : public Linux::CompletionSource {
+class LibUsbEvents final : public CompletionSource {
   public:
     /// Throws std::system_error when no thread can be had. The context outlives the object's `Stop`.
     explicit LibUsbEvents(libusb_context* ownContext);
@@ -22,15 +22,15 @@ class LibUsbEvents final : public Linux::CompletionSource {
     LibUsbEvents& operator=(const LibUsbEvents&) = delete;
 
     /// The own thread takes up the events at once, unless a waiting thread handles them: an aborted transfer
-    /// is not always waited for in a way that works off events.
+    /// is not always waited for in a way that handles events.
     void HandleNow();
     /// The own thread no longer leaves the events to threads that may wait.
     void HandleAlways();
     /// Returns once no thread handles events, and none will.
     void Stop();
 
-    bool TryEnter() override;
-    void WorkOff(Linux::Microseconds deadline) override;
+    bool TryBegin() override;
+    void HandleEvents(std::uint64_t deadline) override;
     void Interrupt() override;
 
   private:

@@ -5,9 +5,8 @@
 #include <algorithm>
 #include <cerrno>
 #include <fstream>
-#include <map>
-#include <mutex>
 #include <optional>
+#include <set>
 #include <sstream>
 #include <utility>
 
@@ -17,12 +16,11 @@
 namespace Varnholt::Platform::Usb {
 namespace {
 
-/// The sockets at which somebody listens: their numbers, by name. A number is not used again for another
-/// socket.
-std::map<std::string, std::string> ListeningSockets() {
+/// The names of the sockets at which somebody listens, in order.
+std::set<std::string> ListeningSockets() {
     constexpr unsigned long acceptsConnections = 0x10000;
     const std::string prefix = std::string("@") + SimulatorSocketPrefix;
-    std::map<std::string, std::string> sockets;
+    std::set<std::string> sockets;
     std::ifstream table("/proc/net/unix");
     std::string line;
     while (std::getline(table, line)) {
@@ -42,7 +40,7 @@ std::map<std::string, std::string> ListeningSockets() {
         if (fields && (flags & acceptsConnections) != 0 && path.starts_with(prefix)) {
             const std::string name = path.substr(prefix.size());
             if (IsSimulatorName(name)) {
-                sockets[name] = number;
+                sockets.insert(name);
             }
         }
     }
@@ -121,31 +119,25 @@ void AskForUser(const std::string& name, SimulatorInfo& info) {
     }
 }
 
-/// Opening an instrument asks some ten times what is there: who listens at a socket stays the same, and a
-/// simulator is troubled once only.
 class SimulatorsOfThisUser final : public UsbBus {
   public:
     std::vector<std::string> List() override {
-        const std::lock_guard lock(mutex_);
-        std::map<std::string, std::uint32_t> users;
         std::vector<std::string> names;
-        for (const auto& [name, socket] : ListeningSockets()) {
-            if (const auto known = userBySocket_.find(socket); known != userBySocket_.end()) {
-                users.insert(*known);
-            } else if (const auto info = Describe(name)) {
-                users[socket] = info->userId;
-            }
-            if (const auto user = users.find(socket); user != users.end() && IsUsable(user->second)) {
+        for (const std::string& name : ListeningSockets()) {
+            if (IsUsableSimulator(name)) {
                 names.push_back(SimulatedPrefix + name);
             }
         }
-        userBySocket_ = std::move(users);
         return names;
     }
 
+    bool Has(const std::string& prefixedName) override {
+        const std::string name = NameBehindPrefix(prefixedName);
+        return IsSimulatorName(name) && IsUsableSimulator(name);
+    }
+
     std::shared_ptr<UsbDevice> Open(const std::string& prefixedName, ErrorCode& error) override {
-        const std::string prefix = SimulatedPrefix;
-        const std::string name = prefixedName.starts_with(prefix) ? prefixedName.substr(prefix.size()) : "";
+        const std::string name = NameBehindPrefix(prefixedName);
         const auto info = IsSimulatorName(name) ? Describe(name) : std::nullopt;
         if (!info) {
             error = Errors::FileNotFound;
@@ -160,15 +152,21 @@ class SimulatorsOfThisUser final : public UsbBus {
     }
 
   private:
-    std::mutex mutex_;                                   // guards what follows
-    std::map<std::string, std::uint32_t> userBySocket_;  // of those that listened the last time
+    static std::string NameBehindPrefix(const std::string& name) {
+        const std::string prefix = SimulatedPrefix;
+        return name.starts_with(prefix) ? name.substr(prefix.size()) : "";
+    }
+    static bool IsUsableSimulator(const std::string& name) {
+        const auto info = Describe(name);
+        return info && info->usable;
+    }
 };
 
 }  // namespace
 
 std::vector<SimulatorInfo> ListSimulators() {
     std::vector<SimulatorInfo> simulators;
-    for (const auto& [name, socket] : ListeningSockets()) {
+    for (const std::string& name : ListeningSockets()) {
         if (auto info = Describe(name)) {
             if (info->usable) {
                 AskForUser(name, *info);

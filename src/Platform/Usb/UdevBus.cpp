@@ -150,8 +150,8 @@ bool IsSettled(std::int64_t changed) {
     return now.tv_sec * NanosecondsPerSecond + now.tv_nsec - changed > CoarsestTick;
 }
 
-/// Opening an instrument asks some ten times what is there: what udev says is kept until it says something
-/// new.
+/// Opening an instrument by its name asks some six times what is there: what udev says is kept until it says
+/// something new.
 class UdevBus final : public UsbBus {
   public:
     std::vector<std::string> List() override {

@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "Platform/CompletionSource.h"
 #include "Platform/ErrorCodes.h"
 
 /// A USB device with asynchronous, cancellable transfers: what the driver behaviour stands on where the
@@ -94,6 +95,10 @@ class UsbDevice {
     virtual void Cancel(Transfer& transfer) = 0;
 
     virtual ErrorCode ClearHalt(std::uint8_t endpoint) = 0;
+
+    /// Where the ends of transfers on `endpoint` come from, for threads that wait for one. Null where that
+    /// makes no difference.
+    virtual std::shared_ptr<CompletionSource> CompletionsOf(std::uint8_t /*endpoint*/) { return nullptr; }
 };
 
 /// Where instruments are plugged in.

@@ -3,7 +3,7 @@
 #include <cstddef>
 
 #include "Platform/CallFilter.h"
-#include "Platform/Win32/SystemInterfaces.h"
+#include "Platform/SystemInterfaces.h"
 #include "Platform/Win32/Windows.h"
 
 namespace Varnholt::Platform {
@@ -24,7 +24,18 @@ OVERLAPPED* SystemRecord(Overlapped& record) {
 class WindowsDeviceFiles final : public DeviceFileSystem {
   public:
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override {
-        return ListSystemInterfaces(interfaceClass);
+        std::vector<std::string> paths;
+        const DeviceList list = MakeSystemList(interfaceClass, true);
+        std::string path;
+        for (std::uint32_t index = 0; list; ++index) {
+            const ErrorCode code = list->ReadPath(interfaceClass, index, path);
+            if (code == Errors::Success) {
+                paths.push_back(path);
+            } else if (code != Errors::NoInterfaceDetail) {
+                break;
+            }
+        }
+        return paths;
     }
 
     Handle Open(const std::string& path) override {

@@ -1,5 +1,4 @@
-#include "Platform/HostQueries.h"
-
+#include "Platform/SystemAnswers.h"
 #include "Platform/Win32/Windows.h"
 
 namespace Varnholt::Platform {
@@ -10,19 +9,13 @@ using IsWow64ProcessFunction = BOOL WINAPI(HANDLE, PBOOL);
 /// Written by the look-up, before anybody can have its result.
 IsWow64ProcessFunction* isWow64Process = nullptr;
 
-std::optional<VersionRecord> versionOverride;
-std::optional<bool> hostOverride;
-
 bool Ask64BitHost(int& flag) {
     return isWow64Process(::GetCurrentProcess(), &flag) != 0;
 }
 
 }  // namespace
 
-VersionRecord ReadVersionRecord() {
-    if (versionOverride) {
-        return *versionOverride;
-    }
+VersionRecord ReadSystemVersion() {
     OSVERSIONINFOA record{};
     static_assert(sizeof record == 148);
     record.dwOSVersionInfoSize = sizeof record;
@@ -39,18 +32,6 @@ Is64BitHostQuery LookUp64BitHostQuery() {
     }
     isWow64Process = FindEntryPoint<IsWow64ProcessFunction>(kernel, "IsWow64Process");
     return isWow64Process ? Ask64BitHost : nullptr;
-}
-
-void OverrideVersionRecord(std::optional<VersionRecord> record) {
-    versionOverride = std::move(record);
-}
-
-void Override64BitHost(std::optional<bool> answer) {
-    hostOverride = answer;
-}
-
-std::optional<bool> Overridden64BitHost() {
-    return hostOverride;
 }
 
 }  // namespace Varnholt::Platform

@@ -1,8 +1,6 @@
 #include "Platform/Time.h"
 
-#include <mutex>
-#include <utility>
-
+#include "Platform/SystemAnswers.h"
 #include "Platform/Win32/Windows.h"
 
 namespace Varnholt::Platform {
@@ -12,9 +10,6 @@ namespace {
 constexpr std::int64_t UnitsPerMillisecond = 10'000;
 constexpr std::int64_t UnitsPerSecond = 1000 * UnitsPerMillisecond;
 constexpr std::int64_t SecondsFrom1601To1970 = 11'644'473'600;
-
-std::mutex observerLock;
-BeepObserver beepObserver;  // guarded by observerLock
 
 }  // namespace
 
@@ -53,22 +48,8 @@ CalendarTime LocalCalendarTime(std::int64_t seconds) {
     return {local.wYear, local.wMonth, local.wDay, local.wHour, local.wMinute, local.wSecond};
 }
 
-void Beep(std::uint32_t hertz, std::uint32_t milliseconds) {
-    BeepObserver observer;
-    {
-        const std::lock_guard held(observerLock);
-        observer = beepObserver;
-    }
-    if (observer) {
-        observer(hertz, milliseconds);
-    } else {
-        ::Beep(hertz, milliseconds);
-    }
-}
-
-void ObserveBeeps(BeepObserver observer) {
-    const std::lock_guard held(observerLock);
-    beepObserver = std::move(observer);
+void SoundSystemBeep(std::uint32_t hertz, std::uint32_t milliseconds) {
+    ::Beep(hertz, milliseconds);
 }
 
 }  // namespace Varnholt::Platform

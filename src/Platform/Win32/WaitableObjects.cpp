@@ -49,6 +49,10 @@ bool SignalEvent(Handle event) {
     return !CallMustFail("SignalEvent") && ::SetEvent(event) != 0;
 }
 
+void ResetEvent(Handle event, const std::shared_ptr<CompletionSource>& /*source*/) {
+    ::ResetEvent(event);
+}
+
 Handle MakeMutex(const std::string& name) {
     return CallMustFail("MakeMutex") ? NoHandle : ::CreateMutexA(nullptr, FALSE, NameOrNull(name));
 }
@@ -96,7 +100,36 @@ WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) 
     return static_cast<WaitResult>(::SignalObjectAndWait(toSignal, toWait, timeout, FALSE));
 }
 
-struct CriticalSection::Impl {
+struct EmbeddedEvent::Impl {
+    HANDLE handle = ::CreateEventA(nullptr, FALSE, FALSE, nullptr);
+};
+
+EmbeddedEvent::EmbeddedEvent() {
+    static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
+    std::construct_at(reinterpret_cast<Impl*>(storage_));
+}
+
+EmbeddedEvent::~EmbeddedEvent() {
+    ::CloseHandle(Own().handle);
+}
+
+EmbeddedEvent::Impl& EmbeddedEvent::Own() {
+    return *std::launder(reinterpret_cast<Impl*>(storage_));
+}
+
+void EmbeddedEvent::Reset(const std::shared_ptr<CompletionSource>& /*source*/) {
+    ::ResetEvent(Own().handle);
+}
+
+void EmbeddedEvent::Signal() {
+    ::SetEvent(Own().handle);
+}
+
+bool EmbeddedEvent::Wait(std::uint32_t timeout) {
+    return ::WaitForSingleObject(Own().handle, timeout) == WAIT_OBJECT_0;
+}
+
+struct RecursiveMutex::Impl {
     Impl() { ::InitializeCriticalSection(&section); }
     ~Impl() { ::DeleteCriticalSection(&section); }
     Impl(const Impl&) = delete;
@@ -105,24 +138,24 @@ struct CriticalSection::Impl {
     CRITICAL_SECTION section{};
 };
 
-CriticalSection::CriticalSection() {
+RecursiveMutex::RecursiveMutex() {
     static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
     std::construct_at(reinterpret_cast<Impl*>(storage_));
 }
 
-CriticalSection::~CriticalSection() {
+RecursiveMutex::~RecursiveMutex() {
     std::destroy_at(&Own());
 }
 
-CriticalSection::Impl& CriticalSection::Own() {
+RecursiveMutex::Impl& RecursiveMutex::Own() {
     return *std::launder(reinterpret_cast<Impl*>(storage_));
 }
 
-void CriticalSection::Enter() {
+void RecursiveMutex::lock() {
     ::EnterCriticalSection(&Own().section);
 }
 
-void CriticalSection::Leave() {
+void RecursiveMutex::unlock() {
     ::LeaveCriticalSection(&Own().section);
 }
 

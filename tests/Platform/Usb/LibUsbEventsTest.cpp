@@ -22,16 +22,17 @@ class LibUsbEventsTest : public testing::Test {
         libusb_set_option(nullptr, LIBUSB_OPTION_NO_DEVICE_DISCOVERY);
         ASSERT_EQ(libusb_init(&context_), LIBUSB_SUCCESS);
         events_ = std::make_shared<LibUsbEvents>(context_);
+        for (const OwnedHandle* event : {&there_, &back_}) {
+            ResetEvent(event->Get(), events_);
+        }
     }
     void TearDown() override {
-        Linux::WorkOffInWaits({});
         events_.reset();
         libusb_exit(context_);
     }
 
     static std::uint32_t Echo(void* test) {
         auto& self = *static_cast<LibUsbEventsTest*>(test);
-        Linux::WorkOffInWaits(self.events_);
         for (int i = 0; i < Rounds; ++i) {
             if (Wait(self.there_.Get(), LongTimeout) != WaitResult::Signalled) {
                 return 1;
@@ -55,7 +56,6 @@ TEST_F(LibUsbEventsTest, ItsThreadTakesNoSignalOfTheHost) {
 /// Each is in libusb, or about to go there, when the other wakes it.
 TEST_F(LibUsbEventsTest, ThreadsThatWakeEachOtherLoseNoSignal) {
     const OwnedHandle echo(StartThread(&LibUsbEventsTest::Echo, this));
-    Linux::WorkOffInWaits(events_);
     for (int i = 0; i < Rounds; ++i) {
         SignalEvent(there_.Get());
         ASSERT_EQ(Wait(back_.Get(), LongTimeout), WaitResult::Signalled) << "round " << i;
@@ -64,7 +64,6 @@ TEST_F(LibUsbEventsTest, ThreadsThatWakeEachOtherLoseNoSignal) {
 }
 
 TEST_F(LibUsbEventsTest, AWaitEndsInTimeAndOutlastsTheEvents) {
-    Linux::WorkOffInWaits(events_);
     EXPECT_EQ(Wait(back_.Get(), 30), WaitResult::TimedOut);
     const OwnedHandle echo(StartThread(&LibUsbEventsTest::Echo, this));
     for (int i = 0; i < Rounds; ++i) {
@@ -81,7 +80,6 @@ TEST_F(LibUsbEventsTest, AWaitEndsInTimeAndOutlastsTheEvents) {
 
 /// An aborted transfer, or the button's, may end when nobody waits.
 TEST_F(LibUsbEventsTest, AfterALongWaitTheirOwnThreadHandlesThemAgain) {
-    Linux::WorkOffInWaits(events_);
     EXPECT_EQ(Wait(back_.Get(), 50), WaitResult::TimedOut);
     const auto patienceEnds = std::chrono::steady_clock::now() + std::chrono::milliseconds(LongTimeout);
     while (libusb_event_handler_active(context_) == 0 && std::chrono::steady_clock::now() < patienceEnds) {

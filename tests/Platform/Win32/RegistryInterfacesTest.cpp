@@ -82,18 +82,16 @@ TEST_F(OldRegistry, AnswersOnlyOldHostsAndOnlyWhenAsked) {
     Add(name);
     const auto finds = [](bool withRegistryFallback) {
         const DeviceList list = DeviceInterfaces::MakeList(InterfaceClass, withRegistryFallback);
-        InterfaceRecord record;
-        const bool found = DeviceInterfaces::Find(list, InterfaceClass, 0, record);
-        const std::uint32_t size = found ? DeviceInterfaces::DetailSize(list, record) : 0;
-        EXPECT_TRUE(DeviceInterfaces::DestroyList(list));
-        return size;
+        std::string path;
+        DeviceInterfaces::ReadPath(list, InterfaceClass, 0, path);
+        return path;
     };
-    EXPECT_EQ(finds(true), InterfaceDetailPathOffset + 4 + name.size() + 1);
-    EXPECT_EQ(finds(false), 0U);
+    EXPECT_EQ(finds(true), "\\\\.\\" + name);
+    EXPECT_EQ(finds(false), "");
     OverrideVersionRecord(VersionRecord{2, 5, 0, 2195, ""});
-    EXPECT_EQ(finds(true), 0U);
+    EXPECT_EQ(finds(true), "");
     OverrideVersionRecord(VersionRecord{1, 4, 10, 1998, ""});
-    EXPECT_EQ(finds(true), 0U);
+    EXPECT_EQ(finds(true), "");
 }
 
 TEST_F(OldRegistry, WithoutTheKeyThereIsNothing) {

@@ -1,5 +1,6 @@
 #include <limits>
 #include <memory>
+#include <mutex>
 #include <new>
 
 #include "Platform/WaitableObjects.h"
@@ -16,7 +17,7 @@ using Platform::WaitResult;
 struct ConditionState {
     std::int32_t waitersCount = 0;  ///< threads inside `Wait`; guarded by `waitersCountLock`
     bool wasBroadcast = false;      ///< a broadcast is being delivered; guarded by `waitersCountLock`
-    Platform::CriticalSection waitersCountLock;
+    Platform::RecursiveMutex waitersCountLock;
     Platform::OwnedHandle semaphore{
         Platform::MakeSemaphore(0, std::numeric_limits<std::int32_t>::max(), std::string())};
     Platform::OwnedHandle waitersDone{Platform::MakeAutoResetEvent()};
@@ -52,7 +53,7 @@ ConditionImpl::ConditionImpl(Mutex& mutexOfCondition) try : mutex_(&mutexOfCondi
 TRACED
 
 bool ConditionImpl::LeaveWaiters() {
-    const Platform::CriticalSection::Holder hold(state_->waitersCountLock);
+    const std::lock_guard hold(state_->waitersCountLock);
     --state_->waitersCount;
     return state_->wasBroadcast && state_->waitersCount == 0;
 }
@@ -60,7 +61,7 @@ bool ConditionImpl::LeaveWaiters() {
 void ConditionImpl::signal() try {
     std::int32_t waiters = 0;
     {
-        const Platform::CriticalSection::Holder hold(state_->waitersCountLock);
+        const std::lock_guard hold(state_->waitersCountLock);
         waiters = state_->waitersCount;
     }
     if (waiters > 0 && !Platform::ReleaseSemaphore(state_->semaphore.Get(), 1)) {
@@ -74,7 +75,7 @@ void ConditionImpl::broadcast() try {
     bool released = false;
     {
         // Held over the release, so that the waiters counted are the ones that are let go.
-        const Platform::CriticalSection::Holder hold(state_->waitersCountLock);
+        const std::lock_guard hold(state_->waitersCountLock);
         if (state_->waitersCount <= 0) {
             return;
         }
@@ -90,7 +91,7 @@ void ConditionImpl::broadcast() try {
     }
     const WaitResult done = Platform::Wait(state_->waitersDone.Get(), Platform::Infinite);
     {
-        const Platform::CriticalSection::Holder hold(state_->waitersCountLock);
+        const std::lock_guard hold(state_->waitersCountLock);
         state_->wasBroadcast = false;
     }
     if (done != WaitResult::Signalled) {
@@ -102,7 +103,7 @@ TRACED
 
 bool ConditionImpl::Wait(std::int32_t) try {
     {
-        const Platform::CriticalSection::Holder hold(state_->waitersCountLock);
+        const std::lock_guard hold(state_->waitersCountLock);
         ++state_->waitersCount;
     }
     const Platform::Handle mutexHandle = mutex_->impl_->GetHandle();

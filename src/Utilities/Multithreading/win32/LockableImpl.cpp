@@ -9,17 +9,17 @@ namespace {
 
 class CriticalSection final : public SynchronizationObject::Impl {
   public:
-    void Lock() override { section_.Enter(); }
+    void Lock() override { section_.lock(); }
     /// Untraced, so that the standard exception stays one.
     bool TryLock(int) override {
         throw std::runtime_error(
             "CriticalSection::TryLock: not yet implemented (TryEnterCriitcalSection not exists on  Win9X)");
     }
-    void Unlock() override { section_.Leave(); }
+    void Unlock() override { section_.unlock(); }
     Platform::Handle GetHandle() override { return &section_; }
 
   private:
-    Platform::CriticalSection section_;
+    Platform::RecursiveMutex section_;
 };
 
 class MutexImpl final : public Win32Lockable<SynchronizationObject::Impl> {

@@ -4,14 +4,15 @@
 #include <array>
 #include <atomic>
 #include <iterator>
+#include <mutex>
 #include <span>
 #include <utility>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/WaitLimit.h"
-#include "DeviceDriver/Ostra/LowLevel/Win32/NativeDeviceList.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/StripReader.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
+#include "Platform/DeviceInterfaces.h"
 #include "Platform/Time.h"
 #include "Platform/WaitableObjects.h"
 #include "Protocol/ByteOrder.h"
@@ -102,7 +103,7 @@ class PellandoUSBDevice::Core final : public EventListener {
         }
         listener->MessageFromDevice(code, parameter);
         if (listener && isGone) {
-            const Platform::CriticalSection::Holder closing(closingLock);
+            const std::lock_guard closing(closingLock);
             ClosePipes();
         }
     }
@@ -120,7 +121,7 @@ class PellandoUSBDevice::Core final : public EventListener {
     USBConnection read;
     USBConnection write;
     /// Keeps the pipes open for the controls that are sent without the device lock.
-    Platform::CriticalSection closingLock;
+    Platform::RecursiveMutex closingLock;
     /// Closing ends the read of the interrupt pipe, which looks as if the instrument had gone.
     std::atomic<bool> isClosing = false;
     std::atomic<bool> isClosed = false;
@@ -172,7 +173,7 @@ void PellandoUSBDevice::HandleUntouchedButton() try {
         MakeBlock(NativeDriver::TypeVendor, static_cast<std::uint8_t>(Protocol::Request::ButtonReport), 3);
     std::array<std::uint8_t, 8> data{};
     const auto length = static_cast<std::uint32_t>(data.size());
-    const Platform::CriticalSection::Holder open(core_->closingLock);
+    const std::lock_guard open(core_->closingLock);
     core_->control.PerformDeviceIOControl(abortPipe, NativeDriver::ControlAbortPipe, data.data(), length,
                                           false);
     core_->control.PerformDeviceIOControl(buttonReport, NativeDriver::ControlButtonReport, data.data(),
@@ -246,7 +247,7 @@ void PellandoUSBDevice::ReadStrip(ScanReceiver& receiver, PartialData partialDat
             throw TimeoutException("Read data failed (Abandoned)", Here());
         }
         if (std::exchange(isFirst, false)) {
-            Platform::Beep(2140, 75);
+            Platform::Beep(Protocol::BeepFrequency, Protocol::BeepDuration);
         }
         if (!reader.HasSucceeded()) {
             HandOverPartialData(reader, receiver, partialData);
@@ -353,7 +354,12 @@ std::vector<std::string> PellandoUSBDevice::GetAllDevices() try {
 TRACED
 
 std::string PellandoUSBDevice::ScanDevice(std::uint16_t index) try {
-    return NativeDeviceList().PathAt(index);
+    using Platform::DeviceInterfaces;
+    constexpr Protocol::Guid interfaceClass = Protocol::NativeDriver::InterfaceClass;
+    std::string path;
+    const Platform::DeviceList list = DeviceInterfaces::MakeList(interfaceClass, true);
+    const Platform::ErrorCode code = DeviceInterfaces::ReadPath(list, interfaceClass, index, path);
+    return code == Platform::Errors::Success ? path : "";
 }
 TRACED
 

@@ -14,7 +14,6 @@
 #include "Platform/ScopedThreadPriority.h"
 #include "Platform/Time.h"
 #include "Protocol/MaximumDevices.h"
-#include "UsbIo/ScopedDeviceList.h"
 #include "Utilities/Exceptions/Location.h"
 #include "Utilities/Exceptions/Trace.h"
 
@@ -53,8 +52,6 @@ constexpr std::uint32_t ScanRecordSize = 256;
 constexpr std::uint32_t ScanRecordTime = 15;  // milliseconds that the instrument may take for one
 
 constexpr std::uint32_t BeepDelay = 370;
-constexpr std::uint32_t BeepHertz = 2140;
-constexpr std::uint32_t BeepLength = 75;
 
 void ThrowIfUsbIoError(std::uint32_t status, const char* operation) {
     if (status == Status::Success) {
@@ -100,17 +97,17 @@ void PellandoFunctionality_Win64::InitUSBIO(std::uint32_t deviceIndex) try {
         throw IOException("No such device connected", Here(), Platform::Errors::FileNotFound);
     }
     const std::string& wanted = *std::next(names.begin(), static_cast<std::ptrdiff_t>(deviceIndex));
-    const UsbIo::ScopedDeviceList list(InterfaceClass);
-    if (!list.Get()) {
+    const Platform::DeviceList list = UsbIo::CUsbIo::CreateDeviceList(&InterfaceClass);
+    if (!list) {
         throw IOException("Unable to create device list.", Here());
     }
     for (int number = 0; number < Protocol::MaximumDevices; ++number) {
-        if (device_->Open(number, list.Get(), &InterfaceClass) != Status::Success) {
+        if (device_->Open(number, list, &InterfaceClass) != Status::Success) {
             break;
         }
         if (device_->GetDevicePathName() == wanted) {
             devicePath_ = wanted;
-            Configure(number, list.Get());
+            Configure(number, list);
             return;
         }
         device_->Close();
@@ -446,7 +443,7 @@ void PellandoFunctionality_Win64::StartBeep() {
 
 void PellandoFunctionality_Win64::BeepTask() try {
     Generic::Utilities::Timing::Instance()->DeviceDriverSleep(BeepDelay);
-    Platform::Beep(BeepHertz, BeepLength);
+    Platform::Beep(Protocol::BeepFrequency, Protocol::BeepDuration);
 }
 TRACED
 

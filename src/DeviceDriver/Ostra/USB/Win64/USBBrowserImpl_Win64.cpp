@@ -1,7 +1,7 @@
 #include "DeviceDriver/Ostra/USB/Win64/USBBrowserImpl_Win64.h"
 
 #include "Protocol/MaximumDevices.h"
-#include "UsbIo/ScopedDeviceList.h"
+#include "UsbIo/CUsbIo.h"
 #include "Utilities/Exceptions/Trace.h"
 
 namespace Varnholt::DeviceDriver::Ostra::USB {
@@ -10,12 +10,12 @@ std::list<std::string> USBBrowserImpl_Win64::GetDevices(const std::int32_t&) try
     const Protocol::Guid& interfaceClass = Protocol::UsbIoDriver::InterfaceClass;
     std::list<std::string> paths;
     UsbIo::CUsbIo device;
-    const UsbIo::ScopedDeviceList list(interfaceClass);
-    if (!list.Get()) {
+    const Platform::DeviceList list = UsbIo::CUsbIo::CreateDeviceList(&interfaceClass);
+    if (!list) {
         return paths;
     }
     for (int number = 0; number < Protocol::MaximumDevices; ++number) {
-        if (device.Open(number, list.Get(), &interfaceClass) != Protocol::UsbIoDriver::Status::Success) {
+        if (device.Open(number, list, &interfaceClass) != Protocol::UsbIoDriver::Status::Success) {
             break;
         }
         paths.emplace_back(device.GetDevicePathName());

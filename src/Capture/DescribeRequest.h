@@ -4,11 +4,11 @@
 #include <span>
 #include <string>
 
-namespace Varnholt::Protocol {
+namespace Varnholt::Capture {
 
 /// What a vendor request says, for people: "SetMeasureParameters p1=294 p2=0 p3=1 p4=6". `data` is its data
 /// stage as far as it is known (out: the bytes sent; in: the bytes received, empty before). A request that
 /// the instrument does not have reads "vendor request 0x99".
 std::string DescribeRequest(std::uint8_t request, std::uint16_t value, std::span<const std::uint8_t> data);
 
-}  // namespace Varnholt::Protocol
+}  // namespace Varnholt::Capture

@@ -5,7 +5,7 @@
 #include <mutex>
 #include <new>
 
-#include "Platform/Linux/Kernel.h"
+#include "Platform/Linux/Dispatcher.h"
 #include "Platform/WaitableObjects.h"
 
 namespace Varnholt::Platform {
@@ -14,15 +14,13 @@ using namespace Linux;
 
 namespace {
 
-class EnteringSection final : public BlockedCall {
+class LockingCall final : public BlockedCall {
   public:
-    EnteringSection(ThreadRecord& caller, std::uint32_t ownersNumber)
+    LockingCall(ThreadRecord& caller, std::uint32_t ownersNumber)
         : BlockedCall(caller), owner_(ownersNumber) {}
-    std::string Describe() const override {
-        return "a critical section owned by thread " + std::to_string(owner_);
-    }
+    std::string Describe() const override { return "a mutex owned by thread " + std::to_string(owner_); }
 
-    EnteringSection* next = nullptr;
+    LockingCall* next = nullptr;
 
   private:
     const std::uint32_t owner_;
@@ -30,103 +28,103 @@ class EnteringSection final : public BlockedCall {
 
 }  // namespace
 
-/// The section's own lock, and not the kernel lock, keeps the threads apart: a tool that looks for data races
-/// then sees exactly the order that the section makes.
-struct CriticalSection::Impl {
+/// The mutex's own lock, and not the dispatcher lock, keeps the threads apart: a tool that looks for data
+/// races then sees exactly the order that the mutex makes.
+struct RecursiveMutex::Impl {
     std::mutex lock;
     std::atomic<const ThreadRecord*> owner = nullptr;
     unsigned depth = 0;  // of the owner only
 
-    // Where threads take turns. Guarded by the kernel lock; the first two are the owner's.
-    bool ownerTakesTurns = false;
+    // Where threads take turns. Guarded by the dispatcher lock; the first two are the owner's.
+    bool ownerIsCooperative = false;
     std::uint32_t ownersNumber = 0;
-    EnteringSection* entering = nullptr;
+    LockingCall* waiting = nullptr;
 
-    void EnterInTurn(ThreadRecord& me, Clock& clock);
-    void LeaveInTurn(Clock& clock);
+    void LockCooperatively(ThreadRecord& me, Clock& clock);
+    void UnlockCooperatively(Clock& clock);
 };
 
-void CriticalSection::Impl::EnterInTurn(ThreadRecord& me, Clock& clock) {
-    KernelHold hold;
+void RecursiveMutex::Impl::LockCooperatively(ThreadRecord& me, Clock& clock) {
+    DispatcherLock hold;
     clock.Preempt(hold);
-    const bool takesTurns = me.state == ThreadRecord::State::Running;
+    const bool isCooperative = me.state == ThreadRecord::State::Running;
     while (!lock.try_lock()) {
-        if (!takesTurns || !ownerTakesTurns) {
+        if (!isCooperative || !ownerIsCooperative) {
             // One of the two is a thread of its own, which goes on while this one waits.
             hold.unlock();
             lock.lock();
             hold.lock();
             break;
         }
-        EnteringSection call(me, ownersNumber);
-        EnteringSection** last = &entering;
+        LockingCall call(me, ownersNumber);
+        LockingCall** last = &waiting;
         while (*last) {
             last = &(*last)->next;
         }
         *last = &call;
         clock.Block(hold, call, Never);
-        EnteringSection** link = &entering;
+        LockingCall** link = &waiting;
         while (*link != &call) {
             link = &(*link)->next;
         }
         *link = call.next;
         if (call.hopeless) {
-            std::fprintf(stderr, "A critical section that is never left cannot be entered.\n");
+            std::fprintf(stderr, "A mutex that is never unlocked cannot be locked.\n");
             std::abort();
         }
     }
-    ownerTakesTurns = takesTurns;
+    ownerIsCooperative = isCooperative;
     ownersNumber = me.number;
 }
 
-void CriticalSection::Impl::LeaveInTurn(Clock& clock) {
-    KernelHold hold;
+void RecursiveMutex::Impl::UnlockCooperatively(Clock& clock) {
+    DispatcherLock hold;
     lock.unlock();
-    for (EnteringSection* call = entering; call; call = call->next) {
+    for (LockingCall* call = waiting; call; call = call->next) {
         clock.Wake(*call);
     }
     clock.Preempt(hold);
 }
 
-CriticalSection::CriticalSection() {
+RecursiveMutex::RecursiveMutex() {
     static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
     std::construct_at(reinterpret_cast<Impl*>(storage_));
 }
 
-CriticalSection::~CriticalSection() {
+RecursiveMutex::~RecursiveMutex() {
     std::destroy_at(&Own());
 }
 
-CriticalSection::Impl& CriticalSection::Own() {
+RecursiveMutex::Impl& RecursiveMutex::Own() {
     return *std::launder(reinterpret_cast<Impl*>(storage_));
 }
 
-void CriticalSection::Enter() {
+void RecursiveMutex::lock() {
     Impl& impl = Own();
     ThreadRecord& me = CurrentThread();
     if (impl.owner.load(std::memory_order_relaxed) != &me) {
         Clock& clock = CurrentClock();
-        if (clock.TakesTurns()) {
-            impl.EnterInTurn(me, clock);
+        if (clock.IsCooperative()) {
+            impl.LockCooperatively(me, clock);
         } else {
             impl.lock.lock();
         }
         impl.owner.store(&me, std::memory_order_relaxed);
-        ++me.sectionsHeld;
+        ++me.recursiveMutexesHeld;
     }
     ++impl.depth;
 }
 
-void CriticalSection::Leave() {
+void RecursiveMutex::unlock() {
     Impl& impl = Own();
     if (--impl.depth > 0) {
         return;
     }
     impl.owner.store(nullptr, std::memory_order_relaxed);
-    --CurrentThread().sectionsHeld;
+    --CurrentThread().recursiveMutexesHeld;
     Clock& clock = CurrentClock();
-    if (clock.TakesTurns()) {
-        impl.LeaveInTurn(clock);
+    if (clock.IsCooperative()) {
+        impl.UnlockCooperatively(clock);
     } else {
         impl.lock.unlock();
     }

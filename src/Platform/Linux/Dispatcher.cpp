@@ -1,4 +1,4 @@
-#include "Platform/Linux/Kernel.h"
+#include "Platform/Linux/Dispatcher.h"
 
 #include <pthread.h>
 
@@ -6,41 +6,41 @@
 #include <atomic>
 #include <utility>
 
-#include "Platform/Linux/Immortal.h"
 #include "Platform/Linux/MutexObject.h"
+#include "Platform/Linux/NoDestructor.h"
 #include "Platform/Linux/RealClock.h"
 #include "Platform/WaitableObjects.h"
 
 namespace Varnholt::Platform::Linux {
 namespace {
 
-std::mutex kernelLock;
+std::mutex dispatcherMutex;
 
 /// Whoever is to be woken when the lock is let go of; guarded by it.
 struct Wakeup {
-    Bell bell = nullptr;
+    WakeCondition condition = nullptr;
     std::shared_ptr<CompletionSource> source;
 
-    void Happen() const {
-        if (bell) {
-            bell->notify_all();
+    void Notify() const {
+        if (condition) {
+            condition->notify_all();
         }
         if (source) {
             source->Interrupt();
         }
     }
 };
-Immortal<Wakeup> keptWakeup;
+NoDestructor<Wakeup> deferredWakeup;
 
 std::atomic<Clock*> installedClock = nullptr;
 std::atomic<std::uint32_t> threadCount = 0;
 
 thread_local ThreadRecord* currentThread = nullptr;
 
-Bell BellOf(std::uint32_t thread) {
-    constexpr std::size_t Bells = 64;
-    static Immortal<std::array<std::condition_variable, Bells>> bells;
-    return &(*bells)[thread % Bells];
+WakeCondition WakeConditionOf(std::uint32_t thread) {
+    constexpr std::size_t WakeConditions = 64;
+    static NoDestructor<std::array<std::condition_variable, WakeConditions>> conditions;
+    return &(*conditions)[thread % WakeConditions];
 }
 
 void ForgetThread(void* record) {
@@ -48,7 +48,6 @@ void ForgetThread(void* record) {
     // The mutexes are abandoned under the record's own name.
     ThreadRecord* const before = BindCurrentThread(&thread);
     AbandonOwned(thread);
-    thread.source.reset();
     BindCurrentThread(before == &thread ? nullptr : before);
 }
 
@@ -84,39 +83,39 @@ class EndOfThreadHook final {
 
 }  // namespace
 
-KernelHold::KernelHold() : std::unique_lock<std::mutex>(kernelLock) {}
+DispatcherLock::DispatcherLock() : std::unique_lock<std::mutex>(dispatcherMutex) {}
 
-KernelHold::~KernelHold() {
+DispatcherLock::~DispatcherLock() {
     if (owns_lock()) {
         unlock();
     }
 }
 
-void KernelHold::unlock() {
-    const Wakeup wakeup = std::exchange(*keptWakeup, {});
+void DispatcherLock::unlock() {
+    const Wakeup wakeup = std::exchange(*deferredWakeup, {});
     std::unique_lock<std::mutex>::unlock();
-    wakeup.Happen();
+    wakeup.Notify();
 }
 
-void KernelHold::RingOnRelease(const Bell& bell) {
-    RingKept();  // one place is enough: hardly anybody wakes two
-    (*keptWakeup).bell = bell;
+void DispatcherLock::NotifyOnRelease(const WakeCondition& condition) {
+    NotifyDeferred();  // one place is enough: hardly anybody wakes two
+    (*deferredWakeup).condition = condition;
 }
 
-void KernelHold::InterruptOnRelease(const std::shared_ptr<CompletionSource>& source) {
-    RingKept();
-    (*keptWakeup).source = source;
+void DispatcherLock::InterruptOnRelease(const std::shared_ptr<CompletionSource>& source) {
+    NotifyDeferred();
+    (*deferredWakeup).source = source;
 }
 
-void KernelHold::RingKept() {
-    std::exchange(*keptWakeup, {}).Happen();
+void DispatcherLock::NotifyDeferred() {
+    std::exchange(*deferredWakeup, {}).Notify();
 }
 
-ThreadRecord::ThreadRecord() : number(++threadCount), turn(BellOf(number)) {}
+ThreadRecord::ThreadRecord() : number(++threadCount), turn(WakeConditionOf(number)) {}
 
 ThreadRecord& CurrentThread() {
     if (!currentThread) {
-        thread_local Immortal<ThreadRecord> own;
+        thread_local NoDestructor<ThreadRecord> own;
         currentThread = &*own;
         endOfThread.Watch(*currentThread);
     }
@@ -133,15 +132,11 @@ ThreadRecord* BindCurrentThread(ThreadRecord* thread) {
 
 void AbandonOwned(ThreadRecord& thread) {
     std::vector<std::shared_ptr<MutexObject>> abandoned;  // may die with this, after the lock is gone
-    const KernelHold hold;
+    const DispatcherLock hold;
     abandoned.swap(thread.owned);
     for (const auto& mutex : abandoned) {
         mutex->Abandon();
     }
-}
-
-void WorkOffInWaits(const std::weak_ptr<CompletionSource>& source) {
-    CurrentThread().source = source;
 }
 
 Clock& CurrentClock() {

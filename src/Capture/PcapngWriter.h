@@ -8,7 +8,9 @@
 
 #include "Platform/Usb/UsbDevice.h"
 
-namespace Varnholt::Platform::Usb {
+namespace Varnholt::Capture {
+
+namespace Usb = Platform::Usb;
 
 /// Writes USB traffic as a pcapng file with link type 220 (Linux usbmon with the 64-byte header), which
 /// protocol analysers read. Formats: pcapng draft-ietf-opsawg-pcapng; link type 220 of the tcpdump link-layer
@@ -19,11 +21,11 @@ class PcapngWriter final {
     PcapngWriter(const std::string& fileName, const std::string& application);
 
     struct Packet {
-        std::uint64_t transferId;   ///< the same for a submission and its completion
-        bool completion;            ///< false: submission
-        std::uint8_t deviceNumber;  ///< 1 to 127
-        const Transfer* transfer;   ///< status and actual length are looked at in completions only
-        std::string comment;        ///< shown beside the packet; may be empty
+        std::uint64_t transferId;       ///< the same for a submission and its completion
+        bool completion;                ///< false: submission
+        std::uint8_t deviceNumber;      ///< 1 to 127
+        const Usb::Transfer* transfer;  ///< status and actual length are looked at in completions only
+        std::string comment;            ///< shown beside the packet; may be empty
     };
     void Write(const Packet& packet);
 
@@ -37,4 +39,4 @@ class PcapngWriter final {
     std::ofstream file_;
 };
 
-}  // namespace Varnholt::Platform::Usb
+}  // namespace Varnholt::Capture

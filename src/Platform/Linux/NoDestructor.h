@@ -9,14 +9,14 @@ namespace Varnholt::Platform::Linux {
 /// process ends. `Object` must hold no memory of its own when it is at rest: what unloading this library
 /// would leave behind.
 template <typename Object>
-class Immortal final {
+class NoDestructor final {
   public:
     template <typename... Arguments>
-    explicit Immortal(Arguments&&... arguments) {
+    explicit NoDestructor(Arguments&&... arguments) {
         new (storage_) Object(std::forward<Arguments>(arguments)...);
     }
-    Immortal(const Immortal&) = delete;
-    Immortal& operator=(const Immortal&) = delete;
+    NoDestructor(const NoDestructor&) = delete;
+    NoDestructor& operator=(const NoDestructor&) = delete;
 
     Object& operator*() { return *std::launder(reinterpret_cast<Object*>(storage_)); }
 

@@ -1,10 +1,10 @@
-#include "Platform/Usb/InterceptingDevice.h"
+#include "Capture/InterceptingDevice.h"
 
-namespace Varnholt::Platform::Usb {
+namespace Varnholt::Capture {
 
-ErrorCode InterceptingDevice::Submit(Transfer& transfer) {
+Platform::ErrorCode InterceptingDevice::Submit(Usb::Transfer& transfer) {
     const auto copy = std::make_shared<Copy>();
-    static_cast<Transfer&>(*copy) = transfer;
+    static_cast<Usb::Transfer&>(*copy) = transfer;
     copy->client = this;
     copy->deviceData = nullptr;
     copy->original = &transfer;
@@ -14,7 +14,7 @@ ErrorCode InterceptingDevice::Submit(Transfer& transfer) {
         running_[&transfer] = copy;
     }
     const std::uint64_t id = copy->id;
-    ErrorCode code = Errors::Success;
+    Platform::ErrorCode code = Platform::Errors::Success;
     try {
         BeforeSubmit(id, *copy);
         code = device_->Submit(*copy);
@@ -22,14 +22,14 @@ ErrorCode InterceptingDevice::Submit(Transfer& transfer) {
         Take(transfer);
         throw;
     }
-    if (code != Errors::Success) {
+    if (code != Platform::Errors::Success) {
         Take(transfer);
         Refused(id, *copy, code);
     }
     return code;
 }
 
-void InterceptingDevice::Cancel(Transfer& transfer) {
+void InterceptingDevice::Cancel(Usb::Transfer& transfer) {
     std::shared_ptr<Copy> copy;
     {
         const std::lock_guard lock(mutex_);
@@ -42,7 +42,7 @@ void InterceptingDevice::Cancel(Transfer& transfer) {
     }
 }
 
-std::shared_ptr<InterceptingDevice::Copy> InterceptingDevice::Take(Transfer& original) {
+std::shared_ptr<InterceptingDevice::Copy> InterceptingDevice::Take(Usb::Transfer& original) {
     const std::lock_guard lock(mutex_);
     const auto found = running_.find(&original);
     std::shared_ptr<Copy> copy = std::move(found->second);
@@ -50,8 +50,8 @@ std::shared_ptr<InterceptingDevice::Copy> InterceptingDevice::Take(Transfer& ori
     return copy;
 }
 
-void InterceptingDevice::TransferCompleted(Transfer& transfer) noexcept {
-    Transfer& original = *static_cast<Copy&>(transfer).original;
+void InterceptingDevice::TransferCompleted(Usb::Transfer& transfer) noexcept {
+    Usb::Transfer& original = *static_cast<Copy&>(transfer).original;
     const std::shared_ptr<Copy> copy = Take(original);
     AfterCompletion(copy->id, *copy);
     original.status = copy->status;
@@ -59,4 +59,4 @@ void InterceptingDevice::TransferCompleted(Transfer& transfer) noexcept {
     original.client->TransferCompleted(original);
 }
 
-}  // namespace Varnholt::Platform::Usb
+}  // namespace Varnholt::Capture

@@ -1,4 +1,4 @@
-#include "Protocol/DescribeTransfer.h"
+#include "Capture/DescribeRequest.h"
 
 #include <array>
 #include <string_view>
@@ -6,7 +6,9 @@
 #include "Protocol/ByteOrder.h"
 #include "Protocol/Instrument.h"
 
-namespace Varnholt::Protocol {
+namespace Varnholt::Capture {
+
+using namespace Protocol;
 namespace {
 
 /// One number of a request's data stage, most significant byte first.
@@ -86,4 +88,4 @@ std::string DescribeRequest(std::uint8_t request, std::uint16_t value, std::span
     return "vendor request " + Hexadecimal(request, 2);
 }
 
-}  // namespace Varnholt::Protocol
+}  // namespace Varnholt::Capture

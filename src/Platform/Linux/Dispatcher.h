@@ -4,15 +4,14 @@
 #include <string>
 #include <vector>
 
+#include "Platform/CompletionSource.h"
 #include "Platform/Linux/Clock.h"
-#include "Platform/Linux/CompletionSource.h"
 
 /// The part of the platform that Windows keeps in its kernel: objects that threads wait for.
 ///
-/// One lock, the kernel lock, guards every waitable object, every thread record and the virtual clock. It is
-/// held for a few instructions at a time, and nothing outside this folder is called meanwhile. No other lock
-/// is waited for while it is held: handles are looked up before, and the locks of critical sections only
-/// tried.
+/// One lock, the dispatcher lock, guards every waitable object, every thread record and the virtual clock. It
+/// is held for a few instructions at a time, and nothing outside this folder is called meanwhile. No other
+/// lock is waited for while it is held: handles are looked up before, and recursive mutexes only tried.
 namespace Varnholt::Platform::Linux {
 
 class MutexObject;
@@ -27,17 +26,16 @@ class ThreadRecord final {
 
     const std::uint32_t number;  ///< for messages
 
-    // Guarded by the kernel lock.
-    const Bell turn;
+    // Guarded by the dispatcher lock.
+    const WakeCondition turn;
     std::vector<std::shared_ptr<MutexObject>> owned;
 
     // Only the thread itself uses these.
     int priority = 0;
     int niceShift = 0;  ///< what the priority has changed of the thread's nice value
-    unsigned sectionsHeld = 0;
-    std::weak_ptr<CompletionSource> source;  ///< worked off in its waits
+    unsigned recursiveMutexesHeld = 0;
 
-    // For the virtual clock, guarded by the kernel lock.
+    // For the virtual clock, guarded by the dispatcher lock.
     enum class State {
         Unknown,  ///< not one of the clock's threads
         Ready,
@@ -69,9 +67,9 @@ class BlockedCall {
 
     ThreadRecord& thread;
     bool woken = false;
-    bool hopeless = false;    ///< the virtual clock found that nothing can ever end the call
-    bool mayWorkOff = false;  ///< a completion source, as long as it blocks
-    std::shared_ptr<CompletionSource> worksOff;  ///< the source, while it does
+    bool hopeless = false;                     ///< the virtual clock found that nothing can ever end the call
+    std::shared_ptr<CompletionSource> source;  ///< whose events the thread may handle while it is blocked
+    bool handlesEvents = false;
 
     /// For the report of a deadlock: what is waited for.
     virtual std::string Describe() const = 0;

@@ -1,43 +1,44 @@
-#include "Platform/Usb/UsbCapture.h"
+#include "Capture/UsbCapture.h"
 
 #include <algorithm>
 
-#include "Platform/Usb/InterceptingDevice.h"
-#include "Protocol/DescribeTransfer.h"
+#include "Capture/DescribeRequest.h"
+#include "Capture/InterceptingDevice.h"
 
-namespace Varnholt::Platform::Usb {
+namespace Varnholt::Capture {
 namespace {
 
-std::string Comment(const Transfer& transfer, bool completion) {
+std::string Comment(const Usb::Transfer& transfer, bool completion) {
     constexpr std::uint8_t vendorType = 0x40;
     if (transfer.endpoint != 0 || (transfer.setup.requestType & 0x60) != vendorType) {
         return {};
     }
     const bool dataKnown = completion || !transfer.IsIn();
     const std::uint32_t length = completion ? transfer.actualLength : transfer.length;
-    return Protocol::DescribeRequest(transfer.setup.request, transfer.setup.value,
-                                     {transfer.data, dataKnown ? length : 0});
+    return DescribeRequest(transfer.setup.request, transfer.setup.value,
+                           {transfer.data, dataKnown ? length : 0});
 }
 
 class CapturedDevice final : public InterceptingDevice {
   public:
-    CapturedDevice(std::shared_ptr<UsbDevice> recordedDevice, PcapngWriter& recorder, std::uint8_t number)
+    CapturedDevice(std::shared_ptr<Usb::UsbDevice> recordedDevice, PcapngWriter& recorder,
+                   std::uint8_t number)
         : InterceptingDevice(std::move(recordedDevice)), writer_(recorder), deviceNumber_(number) {}
     ~CapturedDevice() override { Detach(); }
 
   private:
-    void BeforeSubmit(std::uint64_t id, Transfer& transfer) override {
+    void BeforeSubmit(std::uint64_t id, Usb::Transfer& transfer) override {
         writer_.Write({id, false, deviceNumber_, &transfer, Comment(transfer, false)});
     }
-    void AfterCompletion(std::uint64_t id, Transfer& transfer) noexcept override {
+    void AfterCompletion(std::uint64_t id, Usb::Transfer& transfer) noexcept override {
         try {
             writer_.Write({id, true, deviceNumber_, &transfer, Comment(transfer, true)});
         } catch (...) {  // no memory for the packet: the traffic goes on unrecorded
         }
     }
-    void Refused(std::uint64_t id, Transfer& transfer, ErrorCode code) override {
-        transfer.status =
-            code == Errors::DeviceNotConnected ? TransferStatus::DeviceGone : TransferStatus::IoError;
+    void Refused(std::uint64_t id, Usb::Transfer& transfer, Platform::ErrorCode code) override {
+        transfer.status = code == Platform::Errors::DeviceNotConnected ? Usb::TransferStatus::DeviceGone
+                                                                       : Usb::TransferStatus::IoError;
         transfer.actualLength = 0;
         AfterCompletion(id, transfer);
     }
@@ -48,14 +49,14 @@ class CapturedDevice final : public InterceptingDevice {
 
 }  // namespace
 
-std::shared_ptr<UsbDevice> CaptureDevice(std::shared_ptr<UsbDevice> device, PcapngWriter& writer,
-                                         std::uint8_t deviceNumber) {
+std::shared_ptr<Usb::UsbDevice> CaptureDevice(std::shared_ptr<Usb::UsbDevice> device, PcapngWriter& writer,
+                                              std::uint8_t deviceNumber) {
     return std::make_shared<CapturedDevice>(std::move(device), writer, deviceNumber);
 }
 
-std::shared_ptr<UsbDevice> CapturingBus::Open(const std::string& name, ErrorCode& error) {
+std::shared_ptr<Usb::UsbDevice> CapturingBus::Open(const std::string& name, Platform::ErrorCode& error) {
     constexpr std::uint8_t highestDeviceNumber = 127;
-    std::shared_ptr<UsbDevice> device = bus_.Open(name, error);
+    std::shared_ptr<Usb::UsbDevice> device = bus_.Open(name, error);
     if (!device) {
         return nullptr;
     }
@@ -68,4 +69,4 @@ std::shared_ptr<UsbDevice> CapturingBus::Open(const std::string& name, ErrorCode
                          static_cast<std::uint8_t>(std::min<std::size_t>(number, highestDeviceNumber)));
 }
 
-}  // namespace Varnholt::Platform::Usb
+}  // namespace Varnholt::Capture

@@ -1,4 +1,4 @@
-#include "Platform/Usb/PcapngWriter.h"
+#include "Capture/PcapngWriter.h"
 
 #include <algorithm>
 #include <array>
@@ -8,7 +8,7 @@
 #include "Protocol/ByteOrder.h"
 #include "Protocol/Instrument.h"
 
-namespace Varnholt::Platform::Usb {
+namespace Varnholt::Capture {
 namespace {
 
 constexpr std::uint32_t SectionHeaderBlock = 0x0A0D0D0A;
@@ -77,19 +77,19 @@ void Store64(std::uint8_t* bytes, std::uint64_t value) {
 }
 
 /// The status as the kernel would give it: a negative errno of Linux.
-std::int32_t KernelStatus(TransferStatus status) {
+std::int32_t KernelStatus(Usb::TransferStatus status) {
     switch (status) {
-        case TransferStatus::Completed:
+        case Usb::TransferStatus::Completed:
             return 0;
-        case TransferStatus::Stalled:
+        case Usb::TransferStatus::Stalled:
             return -32;
-        case TransferStatus::IoError:
+        case Usb::TransferStatus::IoError:
             return -71;
-        case TransferStatus::Overflow:
+        case Usb::TransferStatus::Overflow:
             return -75;
-        case TransferStatus::Cancelled:
+        case Usb::TransferStatus::Cancelled:
             return -104;
-        case TransferStatus::DeviceGone:
+        case Usb::TransferStatus::DeviceGone:
             return -108;
     }
     return -71;
@@ -103,7 +103,7 @@ std::uint8_t TransferType(std::uint8_t endpoint) {
 }
 
 std::vector<std::uint8_t> UsbmonPacket(const PcapngWriter::Packet& packet, std::uint64_t microseconds) {
-    const Transfer& transfer = *packet.transfer;
+    const Usb::Transfer& transfer = *packet.transfer;
     const bool isIn = transfer.IsIn();
     const bool hasData = packet.completion == isIn;
     const std::uint32_t urbLength = packet.completion ? transfer.actualLength : transfer.length;
@@ -200,4 +200,4 @@ void PcapngWriter::WriteBlock(std::uint32_t type, std::span<const std::uint8_t> 
     put(std::span(head).subspan(4));
 }
 
-}  // namespace Varnholt::Platform::Usb
+}  // namespace Varnholt::Capture

@@ -1,0 +1,15 @@
+#include "Platform/SystemInterfaces.h"
+
+#include "Platform/DeviceFiles.h"
+
+namespace Varnholt::Platform {
+
+bool LoadSystemInterfaces() {
+    return true;
+}
+
+DeviceList MakeSystemList(const Protocol::Guid& interfaceClass, bool /*withRegistryFallback*/) {
+    return MakePathList(interfaceClass, SystemDeviceFiles().ListInterfaces(interfaceClass));
+}
+
+}  // namespace Varnholt::Platform
