@@ -35,8 +35,10 @@ TEST_F(UsbConnection, ThatIsOpenedAnewLetsGoOfWhatWasOpen) {
     const OwnedHandle event(MakeAutoResetEvent());
     {
         USBConnection connection("native/1", 1, NoHandle);
-        EXPECT_NE(connection.CompletionEvent(), event.Get());
+        const Handle own = connection.CompletionEvent();
+        EXPECT_NE(own, event.Get());
         connection.OpenConnection(event.Get());
+        EXPECT_FALSE(SignalEvent(own)) << "closed with the connection";
         EXPECT_EQ(connection.CompletionEvent(), event.Get());
         EXPECT_EQ(driver_.OpenFiles(), 1u);
     }
