@@ -6,7 +6,7 @@
 #include <set>
 #include <sstream>
 
-#include "Commands/Commands.h"
+#include "Commands/AllCommands.h"
 #include "Commands/CommonOptions.h"
 #include "SystemCommands.h"
 

@@ -1,6 +1,6 @@
 #include <ostream>
 
-#include "Commands/Commands.h"
+#include "Commands/AllCommands.h"
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
 #include "Service/Finding.h"

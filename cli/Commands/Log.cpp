@@ -1,7 +1,7 @@
 #include <fmt/format.h>
 #include <fmt/ostream.h>
 
-#include "Commands/Commands.h"
+#include "Commands/AllCommands.h"
 #include "Commands/CommonOptions.h"
 #include "Memory/MemoryTarget.h"
 #include "Output/Json.h"

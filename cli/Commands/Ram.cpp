@@ -1,6 +1,6 @@
 #include <fmt/format.h>
 
-#include "Commands/Commands.h"
+#include "Commands/AllCommands.h"
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
 #include "Output/Rows.h"

@@ -6,7 +6,7 @@
 #include <optional>
 #include <sstream>
 
-#include "Commands/Commands.h"
+#include "Commands/AllCommands.h"
 #include "Commands/CommonOptions.h"
 #include "Commands/MeasurementOptions.h"
 #include "Commands/MeasurementOutput.h"

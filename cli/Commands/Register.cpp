@@ -8,7 +8,7 @@
 #include <fstream>
 #include <iterator>
 
-#include "Commands/Commands.h"
+#include "Commands/AllCommands.h"
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
 #include "Service/Linux/UdevRule.h"

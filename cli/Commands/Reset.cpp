@@ -1,4 +1,4 @@
-#include "Commands/Commands.h"
+#include "Commands/AllCommands.h"
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
 #include "Protocol/Instrument.h"

@@ -2,7 +2,7 @@
 
 #include <limits>
 
-#include "Commands/Commands.h"
+#include "Commands/AllCommands.h"
 #include "Commands/CommonOptions.h"
 #include "Commands/MeasurementOptions.h"
 #include "Commands/MeasurementOutput.h"

@@ -4,7 +4,7 @@
 
 #include "Capture/PcapngWriter.h"
 #include "Capture/UsbCapture.h"
-#include "Commands/Commands.h"
+#include "Commands/AllCommands.h"
 #include "ExitCode.h"
 #include "Output/Json.h"
 #include "Output/Rows.h"

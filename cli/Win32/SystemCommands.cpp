@@ -1,6 +1,6 @@
 #include "SystemCommands.h"
 
-#include "Commands/Commands.h"
+#include "Commands/AllCommands.h"
 #include "ExitCode.h"
 
 namespace Varnholt::Cli {

@@ -3,9 +3,9 @@
 #include <new>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
+#include "Service/Failure.h"
 #include "Service/Instruments.h"
 #include "Utilities/Files/FileError.h"
-#include "Service/Failure.h"
 
 namespace Varnholt::Tests {
 namespace {
