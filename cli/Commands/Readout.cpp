@@ -196,7 +196,7 @@ void TakeReadouts(Session& session, const Options& options) {
         const Failure failure = EndEarly(session, *output, Noun, false).failure;
         // The user's wish is the only end that it has.
         if (options.repeat != 0 || failure.Kind() != FailureKind::Interrupted || output->Records() > 0) {
-            throw failure;
+            throw Failure(failure);
         }
         // Whoever wants a file is told that there is none.
         if (GoesToFile(options.output)) {

@@ -142,7 +142,7 @@ void Scan(Session& session, const Options& options) {
             ending.how = ending.isShort ? "short" : NameOf(ExitCodeOf(end.failure.Kind()));
             PrintSummary(session, options, identifier, *output, ending, end.file);
         }
-        throw end.failure;
+        throw Failure(end.failure);
     }
     if (options.json) {
         PrintSummary(session, options, identifier, *output, ending, options.output);

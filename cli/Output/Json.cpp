@@ -34,8 +34,8 @@ class JsonPrinter final {
     }
     static Package Convert(const Json::Object& members) {
         Package object = Package::object();
-        for (const Json::Member& member : members) {
-            object[member.name] = Convert(member.value);
+        for (const auto& [name, value] : members) {
+            object[name] = Convert(value);
         }
         return object;
     }
@@ -79,7 +79,7 @@ void Json::Add(std::string name, Json value) {
     if (value_.index() == 0) {
         value_ = Object();
     }
-    std::get<Object>(value_).push_back({std::move(name), std::move(value)});
+    std::get<Object>(value_).emplace_back(std::move(name), std::move(value));
 }
 
 void Json::Append(Json element) {
@@ -90,8 +90,8 @@ void Json::Append(Json element) {
 }
 
 void Json::AddAll(const Json& object) {
-    for (const Member& member : std::get<Object>(object.value_)) {
-        Add(member.name, member.value);
+    for (const auto& [name, value] : std::get<Object>(object.value_)) {
+        Add(name, value);
     }
 }
 

@@ -7,6 +7,7 @@
 #include <ranges>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <variant>
 #include <vector>
 
@@ -23,8 +24,8 @@ concept JsonElements =
 /// that the output is stable).
 class Json final {
   public:
-    struct Member;
     using Array = std::vector<Json>;
+    using Member = std::pair<std::string, Json>;
     using Object = std::vector<Member>;
 
     Json() = default;
@@ -63,11 +64,6 @@ class Json final {
     friend class JsonPrinter;
 
     std::variant<std::monostate, bool, std::int64_t, double, std::string, Array, Object> value_;
-};
-
-struct Json::Member {
-    std::string name;
-    Json value;
 };
 
 }  // namespace Varnholt::Cli

@@ -25,7 +25,8 @@ class Raster final {
 
   private:
     std::size_t IndexOf(int column, int row) const {
-        return static_cast<std::size_t>(row * columns + column);
+        return static_cast<std::size_t>(row) * static_cast<std::size_t>(columns) +
+               static_cast<std::size_t>(column);
     }
 
     std::vector<bool> dots_;
@@ -153,7 +154,8 @@ int HeightOf(const PlotStyle& style) {
 /// The value in the middle of the labelled line.
 std::string MiddleLabel(const Scale& scale, int height, bool braille) {
     const int rowsOfLine = braille ? DotRows : 1;
-    const double dot = (height - 1 - height / 2) * rowsOfLine + (rowsOfLine - 1) / 2.0;
+    const int line = height - 1 - height / 2;  // from the bottom
+    const double dot = line * rowsOfLine + (rowsOfLine - 1) / 2.0;
     return Label(scale.low + (scale.high - scale.low) * dot / (height * rowsOfLine - 1));
 }
 

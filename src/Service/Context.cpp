@@ -51,7 +51,7 @@ void Context::Sleep(std::uint32_t milliseconds) const {
 }
 
 Failure Context::Explain(const std::exception_ptr& exception, const std::string& identifier) const {
-    const Failure failure = Describe(exception);
+    Failure failure = Describe(exception);
     if (IsOwn(exception)) {
         return failure;
     }

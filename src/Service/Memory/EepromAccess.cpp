@@ -62,7 +62,7 @@ std::string NewBackupName(OpenedInstrument& instrument) {
                     now.month, now.day, now.hour, now.minute, now.second);
     std::error_code error;
     for (int number = 1;; ++number) {
-        const std::string candidate = base + (number == 1 ? "" : fmt::format("-{}", number)) + ".eeprom";
+        std::string candidate = base + (number == 1 ? "" : fmt::format("-{}", number)) + ".eeprom";
         if (!std::filesystem::exists(candidate, error)) {
             return candidate;
         }
@@ -147,14 +147,14 @@ WrittenChange ChangeEeprom(OpenedInstrument& instrument, const EepromImage& pres
 
 std::string SaveBackup(OpenedInstrument& instrument, const EepromImage& content, const std::string& file) {
     using Utilities::Files::AtomicFile;
-    const std::string name = file.empty() ? NewBackupName(instrument) : file;
+    std::string name = file.empty() ? NewBackupName(instrument) : file;
     try {
         Utilities::Files::WriteFileAtomically(name, content, AtomicFile::IfItExists::Refuse);
     } catch (...) {
-        const Failure failure = Describe(std::current_exception());
         if (!file.empty()) {
-            throw failure;
+            throw Describe(std::current_exception());
         }
+        const Failure failure = Describe(std::current_exception());
         throw failure.Saying("no backup can be made in the current folder, and nothing was changed: " +
                              failure.Message());
     }
