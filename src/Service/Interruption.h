@@ -46,7 +46,7 @@ class Interruption final {
     std::atomic<bool> requested_{false};
     std::atomic<int> deferrals_{0};
     Platform::OwnedHandle event_;
-    Platform::RecursiveMutex section_;  ///< guards `action`
+    Platform::RecursiveMutex section_;  ///< guards `action_`
     std::function<void()> action_;
 };
 

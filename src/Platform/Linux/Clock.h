@@ -21,8 +21,8 @@ using Microseconds = std::uint64_t;
 inline constexpr Microseconds Never = std::numeric_limits<Microseconds>::max();
 
 /// What a thread waits at. There is a fixed number of them, which are never destroyed: one takes no
-/// memory and can be rung after its thread has ended. Threads may share one, so all who wait are woken, and
-/// look.
+/// memory and can be notified after its thread has ended. Threads may share one, so all who wait are woken,
+/// and look.
 using WakeCondition = std::condition_variable*;
 
 /// The dispatcher lock, held. See Dispatcher.h.
