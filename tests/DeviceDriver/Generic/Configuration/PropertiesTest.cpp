@@ -1,6 +1,8 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <functional>
+
 #include "DeviceDriver/Generic/Configuration/Properties.h"
 #include "Support/ExpectThrow.h"
 #include "Utilities/Exceptions/Exceptions.h"
@@ -13,74 +15,125 @@ using Tests::ExpectThrow;
 using Varnholt::Utilities::Exceptions::ResourceException;
 using Varnholt::Utilities::Exceptions::RuntimeException;
 using Bytes = std::vector<std::uint8_t>;
+using Longs = std::vector<std::int32_t>;
+using Floats = std::vector<float>;
 
-Property Long(std::int32_t value) {
-    return Property(value);
+constexpr const char* InvalidType = "Invalid configuration data type.";
+
+struct Case {
+    const char* name;
+    Property constructed;
+    std::function<Property&(Property&)> assign;
+    PropertyType type;
+    Longs longs;
+    Floats floats;
+    Bytes bigEndian;
+};
+
+template <class Value>
+Case Of(const char* name, Value value, PropertyType type, const Longs& longs, const Floats& floats,
+        const Bytes& bigEndian) {
+    return {
+        name,     Property(value), [value](Property& target) -> Property& { return target.Assign(value); },
+        type,     longs,           floats,
+        bigEndian};
+}
+
+TEST(Property, HoldsWhatItWasGivenWhateverWasThere) {
+    const Case cases[] = {
+        Of("8 bits extended", std::int8_t{-3}, TypeLong, {-3}, {}, {0xFF, 0xFF, 0xFF, 0xFD}),
+        Of("16 bits extended", std::int16_t{-2}, TypeLong, {-2}, {}, {0xFF, 0xFF, 0xFF, 0xFE}),
+        Of("32 bits", std::int32_t{0x01020304}, TypeLong, {0x01020304}, {}, {1, 2, 3, 4}),
+        Of("float", 1.0F, TypeFloat, {}, {1.0F}, {0x3F, 0x80, 0, 0}),
+        Of("integers", Longs{1, -1}, TypeLongVector, {1, -1}, {}, {0, 0, 0, 1, 255, 255, 255, 255}),
+        Of("floats", Floats{-2.0F}, TypeFloatVector, {}, {-2.0F}, {0xC0, 0, 0, 0}),
+        Of("no integers", Longs{}, TypeLongVector, {}, {}, {}),
+    };
+    for (const Case& row : cases) {
+        for (const Case& before : cases) {
+            SCOPED_TRACE(std::string(row.name) + " over " + before.name);
+            Property assigned = before.constructed;
+            for (const Property& value : {row.constructed, row.assign(assigned)}) {
+                EXPECT_EQ(value.GetType(), row.type);
+                EXPECT_EQ(value.AsLongVector(), row.longs);
+                EXPECT_EQ(value.AsFloatVector(), row.floats);
+                EXPECT_EQ(value.SizeOf(), row.bigEndian.size());
+                EXPECT_EQ(value.AsByteVector(true), row.bigEndian);
+            }
+        }
+    }
+}
+
+TEST(Property, BytesRefillTheValueAndKeepTheType) {
+    const Bytes ten{0x3F, 0x80, 0, 0, 0x80, 0, 0, 1, 9, 9};
+    for (Property longs : {Property(Longs{5}), Property(std::int32_t{7})}) {
+        const PropertyType type = longs.GetType();
+        EXPECT_THAT(longs.Assign(ten, true).AsLongVector(), ElementsAre(0x3F800000, -0x7FFFFFFF));
+        EXPECT_THAT(longs.Assign(ten, false).AsLongVector(), ElementsAre(0x0000803F, 0x01000080));
+        EXPECT_EQ(longs.AsByteVector(false), Bytes(ten.begin(), ten.begin() + 8));
+        EXPECT_EQ(longs.GetType(), type);
+        EXPECT_EQ(longs.Assign(Bytes{1, 2, 3}, true).SizeOf(), 0U);
+    }
+    Property real(0.0F);
+    EXPECT_EQ(real.Assign(Bytes{0, 0, 0x80, 0x3F}, false).AsFloat(), 1.0F);
+    EXPECT_THAT(real.Assign(ten, true).AsFloatVector(), ElementsAre(1.0F, testing::Lt(0)));
+    EXPECT_EQ(real.GetType(), TypeFloat);
+}
+
+TEST(Property, WithoutATypeOrAnElementNothingIsRead) {
+    Property none;
+    EXPECT_EQ(none.SizeOf(), 0U);
+    const std::function<void()> reads[] = {[&] { none.Assign(Bytes(4), true); },
+                                           [&] { none.AsByteVector(true); },
+                                           [] { static_cast<void>(Property(Longs()).AsLong()); },
+                                           [] { static_cast<void>(Property(1.0F).AsLong()); },
+                                           [] { static_cast<void>(Property(Floats()).AsFloat()); }};
+    for (const auto& read : reads) {
+        ExpectThrow<RuntimeException>(InvalidType, read);
+    }
 }
 
 TEST(Properties, KeepTheOrderInWhichIdentifiersWereFirstStored) {
     Properties set("Some");
+    const Properties& readOnly = set;
     for (const std::uint16_t id : std::vector<std::uint16_t>{30, 10, 20, 10, 65535}) {
-        set.SetProperty(id, Long(id));
+        set.SetProperty(id, Property(std::int32_t{id}));
     }
     set.SetProperty(10, Property(1.5F));
     EXPECT_THAT(set.GetPropertyKeys(), ElementsAre(30, 10, 20, 65535));
-    EXPECT_EQ(set.GetItemCount(), 4U);
-    EXPECT_EQ(set.GetProperty(10).GetType(), TypeFloat);
+    EXPECT_EQ(readOnly.GetProperty(10).GetType(), TypeFloat);
     EXPECT_EQ(set.GetName(), "Some");
     EXPECT_TRUE(set.Contains(65535));
     EXPECT_FALSE(set.Contains(5));
-}
-
-TEST(Properties, RefuseAnAbsentIdentifierByItsNumber) {
-    Properties set;
-    const Properties& readOnly = set;
     ExpectThrow<ResourceException>("id 5 doesn't exist", [&] { set.GetProperty(5); });
-    ExpectThrow<ResourceException>("id 65535 doesn't exist", [&] { readOnly.GetProperty(65535); });
+    ExpectThrow<ResourceException>("id 65534 doesn't exist", [&] { readOnly.GetProperty(65534); });
     EXPECT_EQ(Properties::GetExceptionText(1234), "Requested data is not available (ID 1234)");
 }
 
 TEST(Properties, DumpIsAStreamOfValuesWithOrWithoutIdentifiers) {
     Properties set;
-    set.SetProperty(258, Long(1));
-    set.SetProperty(3, Property(std::vector<float>{1.0F, -1.0F, 0.0F}));
-    const Bytes withIdentifiers{1, 2, 0,    0,    0, 1,  // 258
-                                0, 3, 0x3F, 0x80, 0, 0, 0xBF, 0x80, 0, 0, 0, 0, 0, 0};
-    const Bytes valuesOnly{0, 0, 0, 1, 0x3F, 0x80, 0, 0, 0xBF, 0x80, 0, 0, 0, 0, 0, 0};
-    const Bytes littleEndian{2, 1, 1, 0, 0,    0,  //
-                             3, 0, 0, 0, 0x80, 0x3F, 0, 0, 0x80, 0xBF, 0, 0, 0, 0};
-    struct Case {
-        bool valuesOnly;
-        bool bigEndian;
+    set.SetProperty(258, Property(std::int32_t{1}));
+    set.SetProperty(3, Property(Floats{1.0F, -1.0F}));
+    const struct {
+        bool valuesOnly, bigEndian;
         Bytes expected;
-    };
-    for (const Case& row : {Case{false, true, withIdentifiers}, Case{true, true, valuesOnly},
-                            Case{false, false, littleEndian}}) {
-        ASSERT_EQ(set.SizeOf(row.valuesOnly), row.expected.size());
-        Bytes exact(row.expected.size());
-        set.Dump(exact.begin(), exact.end(), row.valuesOnly, row.bigEndian);
-        EXPECT_EQ(exact, row.expected);
-
-        Bytes longer(row.expected.size() + 2, 0xAA);
-        set.Dump(longer.begin(), longer.end(), row.valuesOnly, row.bigEndian);
-        EXPECT_EQ(longer[row.expected.size()], 0xAA);
-
-        Bytes shorter(row.expected.size() - 1, 0xAA);
-        ExpectThrow<ResourceException>("Configuration data dump target too small", [&] {
-            set.Dump(shorter.begin(), shorter.end(), row.valuesOnly, row.bigEndian);
-        });
-        EXPECT_EQ(shorter, Bytes(row.expected.size() - 1, 0xAA)) << "nothing may be written";
+    } cases[] = {{false, true, {1, 2, 0, 0, 0, 1, 0, 3, 0x3F, 0x80, 0, 0, 0xBF, 0x80, 0, 0}},
+                 {true, true, {0, 0, 0, 1, 0x3F, 0x80, 0, 0, 0xBF, 0x80, 0, 0}},
+                 {false, false, {2, 1, 1, 0, 0, 0, 3, 0, 0, 0, 0x80, 0x3F, 0, 0, 0x80, 0xBF}}};
+    for (const auto& row : cases) {
+        const auto dump = [&](std::size_t room) {
+            Bytes bytes(room, 0xAA);
+            set.Dump(bytes.begin(), bytes.end(), row.valuesOnly, row.bigEndian);
+            return bytes;
+        };
+        const std::size_t size = row.expected.size();
+        EXPECT_EQ(dump(size), row.expected);
+        EXPECT_EQ(dump(size + 1)[size], 0xAA);
+        ExpectThrow<ResourceException>("Configuration data dump target too small", [&] { dump(size - 1); });
     }
-}
-
-TEST(Properties, DumpStopsAtAnEntryWithoutAType) {
-    Properties set;
-    set.SetProperty(1, Long(7));
     set.SetProperty(2, Property());
-    Bytes bytes(16, 0xAA);
-    ExpectThrow<RuntimeException>("Invalid configuration data type.",
-                                  [&] { set.Dump(bytes.begin(), bytes.end(), false, true); });
-    EXPECT_EQ(Bytes(bytes.begin(), bytes.begin() + 6), (Bytes{0, 1, 0, 0, 0, 7}));
+    Bytes bytes(18);
+    ExpectThrow<RuntimeException>(InvalidType, [&] { set.Dump(bytes.begin(), bytes.end(), false, true); });
 }
 
 }  // namespace

@@ -1,49 +1,89 @@
 #include <cstring>
+#include <functional>
+#include <optional>
 #include <sstream>
 
+#include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoFunctionality_PC.h"
-#include "DeviceDriver/Ostra/LowLevel/Win64/PellandoFunctionality_Win64.h"
 #include "Platform/HostQueries.h"
 #include "Platform/ScopedThreadPriority.h"
 #include "Protocol/Instrument.h"
+#include "Protocol/UsbIoDriver.h"
 #include "Support/Transport.h"
+#include "Utilities/Exceptions/Exceptions.h"
 #include "Win32/NativeTest.h"
 
 namespace Varnholt::Tests {
 namespace {
 
 using namespace Platform;
-using DeviceDriver::Ostra::LowLevel::Bytes2;
-using DeviceDriver::Ostra::LowLevel::Bytes4;
+using DeviceDriver::Generic::MessageButtonData;
+using DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
 using DeviceDriver::Ostra::LowLevel::PellandoFunctionality_PC;
-using DeviceDriver::Ostra::LowLevel::PellandoFunctionality_Win64;
+using DeviceDriver::Ostra::LowLevel::PellandoFunctionalityByte;
 using Protocol::UsbIoDriver::Status::EndpointHalted;
-using I = DeviceDriver::Ostra::LowLevel::PellandoFunctionalityByte;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using Utilities::Exceptions::InvalidArgumentException;
+using Utilities::Exceptions::NullPointerException;
+using I = PellandoFunctionality;
+using Pointer = Utilities::Tools::SmartPointer<PellandoFunctionalityByte>;
 
-/// A command as the transports of both drivers carry it.
+/// What the transport of this driver sends for one command: request and value, the bytes sent or "[room]" for
+/// what comes in; bulk transfers behind it, as in "C0@0|in [4]".
+Lines OnTheWire(bool isNative, const std::string& wire) {
+    std::istringstream text(wire);
+    unsigned request = 0, value = 0;
+    char at = 0;
+    text >> std::hex >> request >> at >> value;
+    std::string data, transfer;
+    std::getline(text, data, '|');
+    const int direction = data.starts_with(" [") ? 1 : 0;
+    char line[80];
+    std::snprintf(line, sizeof line,
+                  isNative
+                      ? "control 22000D %02X 02 00 00 %02X 00 %02X %02X 00 00 /"
+                      : "control 8094203%X 00 00 00 00 02 00 00 00 00 00 00 00 00 %02X %02X %02X 00 00 /",
+                  isNative ? direction : 5 - 3 * direction, request, value & 0xFFU, value >> 8U);
+    Lines lines{line + data};
+    while (std::getline(text, transfer, '|')) {
+        const bool isRead = transfer.starts_with("in");
+        lines.push_back(std::string(isRead ? "read " : "write ") +
+                        (isNative ? (isRead ? "1" : "2") : (isRead ? "82" : "3")) +
+                        transfer.substr(transfer.find(' ')));
+    }
+    return lines;
+}
+
+/// The command set over either driver.
 class Commands : public DriverTest, public testing::WithParamInterface<Transport> {
   protected:
-    Commands() { Override64BitHost(!IsNative()); }
+    Commands() : DriverTest(TestTime::RealForThreadSanitizer, Paths(2)) { Override64BitHost(!IsNative()); }
     ~Commands() override {
+        Close();
         Override64BitHost(std::nullopt);
         EXPECT_EQ(driver_.OpenFiles(), 0U);
     }
 
+    static Lines Paths(std::size_t count) {
+        const std::string path = std::string(Name(GetParam())) + "/";
+        return count == 0 ? Lines() : Lines{path + "1", path + "2"};
+    }
     static bool IsNative() { return GetParam() == Transport::Native; }
     static std::uint32_t In() { return IsNative() ? 1U : Protocol::BulkInEndpoint; }
     static std::uint32_t Out() { return IsNative() ? 2U : Protocol::BulkOutEndpoint; }
     static std::uint32_t Interrupts() { return IsNative() ? 3U : Protocol::InterruptInEndpoint; }
 
-    std::unique_ptr<I> Open() {
-        std::unique_ptr<I> opened;
-        if (IsNative()) {
-            opened = std::make_unique<PellandoFunctionality_PC>(nullptr, 0);
-        } else {
-            opened = std::make_unique<PellandoFunctionality_Win64>(nullptr, 0);
-        }
+    PellandoFunctionality& Open() {
+        transport_ = PellandoFunctionalityByte::Instance(&listener_, 0);
+        instrument_.emplace(transport_);
         WaitUntil([this] { return driver_.Running(Interrupts()) == 1; });
         driver_.TakeTranscript();
-        return opened;
+        return *instrument_;
+    }
+    void Close() {
+        instrument_.reset();
+        transport_ = Pointer();
     }
     /// Without the interrupt listener's reads.
     Lines TakeTransfers() {
@@ -53,62 +93,38 @@ class Commands : public DriverTest, public testing::WithParamInterface<Transport
         });
         return lines;
     }
+    void ExpectOnTheWire(const std::string& wire) { EXPECT_EQ(TakeTransfers(), OnTheWire(IsNative(), wire)); }
+
+    RecordingListener listener_;
+    Pointer transport_;
+    std::optional<PellandoFunctionality> instrument_;
 };
 INSTANTIATE_TEST_SUITE_P(Transports, Commands, testing::Values(Transport::Native, Transport::UsbIo),
                          [](const auto& parameter) { return std::string(Name(parameter.param)); });
 
-const Bytes2 P1{0x01, 0x2C}, P2{0x03, 0x04}, P3{0x05, 0x06}, Length{0x01, 0x03}, ResetCode{0x55, 0x1F};
-const Bytes4 Address{0x00, 0x00, 0x10, 0x00};
-const Bytes Image = Counting(3, 0x31);
-
 // What commands hand out.
 const Bytes None;
-Bytes2 a, b, c;
+std::uint16_t a, b, c;
 Bytes m(8);
 
 Bytes Parameters(std::uint8_t first, std::uint8_t second) {
-    return {a[0], a[1], b[0], b[1], c[0], c[1], first, second};
+    Bytes bytes;
+    for (const std::uint16_t value : {a, b, c}) {
+        bytes.insert(bytes.end(), {static_cast<std::uint8_t>(value >> 8), static_cast<std::uint8_t>(value)});
+    }
+    bytes.insert(bytes.end(), {first, second});
+    return bytes;
 }
 
 struct Command {
     const char* name;
-    /// Request and value, the bytes sent or "[room]" for what comes in; bulk transfers behind it: "in [4]".
     const char* wire;
     std::function<Bytes(I&)> run;  ///< gives what the command handed out, in the order of the wire
-
-    Lines Transcript(bool isNative) const {
-        std::istringstream text(wire);
-        unsigned request = 0, value = 0;
-        char at = 0;
-        text >> std::hex >> request >> at >> value;
-        std::string data, transfer;
-        std::getline(text, data, '|');
-        const int direction = data.starts_with(" [") ? 1 : 0;
-        char line[80];
-        std::snprintf(line, sizeof line,
-                      isNative
-                          ? "control 22000D %02X 02 00 00 %02X 00 %02X %02X 00 00 /"
-                          : "control 8094203%X 00 00 00 00 02 00 00 00 00 00 00 00 00 %02X %02X %02X 00 00 /",
-                      isNative ? direction : 5 - 3 * direction, request, value & 0xFFU, value >> 8U);
-        Lines lines{line + data};
-        while (std::getline(text, transfer, '|')) {
-            const bool isRead = transfer.starts_with("in");
-            lines.push_back(std::string(isRead ? "read " : "write ") +
-                            (isNative ? (isRead ? "1" : "2") : (isRead ? "82" : "3")) +
-                            transfer.substr(transfer.find(' ')));
-        }
-        return lines;
-    }
-    /// Of the instrument, in the data stage or as bulk data.
-    Bytes Answer() const {
-        const char* const room = std::strchr(wire, '[');
-        return room ? Counting(std::strtoul(room + 1, nullptr, 10), 0xA1) : Bytes();
-    }
 };
 
 const Command EachCommand[] = {
     {"SetMeasureParameters", "C1@0 01 2C 03 04 05 06 07 00",
-     [](I& i) { return i.SetMeasureParameters(P1, P2, P3, 7), None; }},
+     [](I& i) { return i.SetMeasureParameters(0x012C, 0x0304, 0x0506, 7), None; }},
     {"GetMeasureParameters", "C2@0 [8]",
      [](I& i) { return i.GetMeasureParameters(a, b, c, m[0], m[1]), Parameters(m[0], m[1]); }},
     {"SetMeasureMode", "CF@0 42", [](I& i) { return i.SetMeasureMode(0x42), None; }},
@@ -116,133 +132,247 @@ const Command EachCommand[] = {
      [](I& i) { return i.GetMeasureMode(m[0], m[1], m[2], m[3], m[4], m[5]), Bytes(&m[0], &m[6]); }},
     {"MeasureRequest", "C0@0|in [4]",
      [](I& i) { return i.MeasureRequest(m.data(), 4, 1), Bytes(&m[0], &m[4]); }},
-    {"WriteEEPROM", "C3@0 00 00 10 00 01 03 00 00|out 31 32 33|out 00|out 00",
-     [](I& i) { return i.WriteEEPROM(Address, Length, Image.data(), 3), None; }},
-    {"ReadEEPROM", "C4@0 00 00 10 00 01 03 00 00|in [8]",
-     [](I& i) { return i.ReadEEPROM(Address, Length, m.data(), 8), m; }},
-    {"WriteCPLD", "C7@0 01 2C 03 04 05 06", [](I& i) { return i.WriteCPLD(P1, P2, P3), None; }},
-    {"ReadCPLD", "C8@0 [2]", [](I& i) { return i.ReadCPLD(a), Bytes(a.begin(), a.end()); }},
+    {"WriteEEPROM", "C3@0 00 01 10 00 00 03 00 00|out 31 32 33|out 00|out 00",
+     [](I& i) { return i.WriteEEPROM(0x11000, Counting(3, 0x31)), None; }},
+    {"WriteCPLD", "C7@0 01 2C 03 04 05 06", [](I& i) { return i.WriteCPLD(0x012C, 0x0304, 0x0506), None; }},
+    {"ReadCPLD", "C8@0 [2]",
+     [](I& i) {
+         return i.ReadCPLD(a), Bytes{Parameters(0, 0)[0], Parameters(0, 0)[1]};
+     }},
     {"DownloadRAMFirmware", "A0@1234 31 32 33",
-     [](I& i) { return i.DownloadRAMFirmware(0x1234, Image.data(), 3), None; }},
-    {"DownloadRAMFirmware of nothing", "A0@0",
-     [](I& i) { return i.DownloadRAMFirmware(0, Image.data(), 0), None; }},
-    {"DownloadEEPROMFirmware", "CB@0 00 00 10 00 01 03 00 00|out 31 32 33|out 00|out 00",
-     [](I& i) { return i.DownloadEEPROMFirmware(Address, Length, Image.data(), 3), None; }},
+     [](I& i) { return i.DownloadFirmware(0x1234, Counting(3, 0x31), false), None; }},
+    {"DownloadEEPROMFirmware", "CB@0 00 00 12 34 00 03 00 00|out 31 32 33|out 00|out 00",
+     [](I& i) { return i.DownloadFirmware(0x1234, Counting(3, 0x31), true), None; }},
     {"GetMISC", "C9@0 [8]", [](I& i) { return i.GetMISC(m[0], a, m[1], b, c), Parameters(m[0], m[1]); }},
-    {"GetChipID", "D2@0 [8]", [](I& i) { return i.GetChipID(m.data()), m; }},
-    {"Reset", "CA@0 1F", [](I& i) { return i.Reset(ResetCode), None; }},
+    {"Reset", "CA@0 1F", [](I& i) { return i.Reset(0x551F), None; }},
 };
 
 TEST_P(Commands, OnTheWire) {
-    auto instrument = Open();
     for (const Command& command : EachCommand) {
         SCOPED_TRACE(command.name);
-        if (IsNative()) {
-            instrument.reset();  // over this driver a command leaves bytes to the next one
-            instrument = Open();
-        }
-        a = b = c = {};
-        m.assign(m.size(), 0);
+        Close();  // over one of the drivers a command leaves bytes to the next one
+        PellandoFunctionality& instrument = Open();
+        a = b = c = 0;
+        m.assign(8, 0);
+        const char* const room = std::strchr(command.wire, '[');
+        const Bytes answer = room ? Counting(std::strtoul(room + 1, nullptr, 10), 0xA1) : Bytes();
         driver_.DropScript(0);
-        driver_.Script(std::strstr(command.wire, "|in") ? In() : 0, {.data = command.Answer()});
+        driver_.Script(std::strstr(command.wire, "|in") ? In() : 0, {.data = answer});
         const Stopwatch watch(clock_);
-        EXPECT_EQ(command.run(*instrument), command.Answer());
+        EXPECT_EQ(command.run(instrument), answer);
         watch.ExpectBetween(1, 2);  // a request takes a pause of a millisecond
-        EXPECT_EQ(TakeTransfers(), command.Transcript(IsNative()));
+        ExpectOnTheWire(command.wire);
     }
     driver_.DropScript(0);
+    driver_.Script(0, {.data = Counting(8, 0xA1)});
+    transport_->GetChipID(m.data());
+    EXPECT_EQ(m, Counting(8, 0xA1));
+    ExpectOnTheWire("D2@0 [8]");
+    std::string identifier;
+    instrument_->GetDeviceIdentifier(identifier);
+    EXPECT_EQ(identifier, Paths(1)[0]);
+}
+
+TEST_P(Commands, MoveMemoryInPiecesThatTheWireCanCarry) {
+    PellandoFunctionality& instrument = Open();
+    const Bytes data = Counting(257);
+    instrument.WriteEEPROM(0x1000, data);
+    instrument.WriteEEPROM(0, {});
+    Lines lines =
+        OnTheWire(IsNative(), "C3@0 00 00 10 00 01 00 00 00|out " + Hex(&data[0], 256) + "|out 00|out 00");
+    for (const std::string& line :
+         OnTheWire(IsNative(), "C3@0 00 00 11 00 00 01 00 00|out 00|out 00|out 00")) {
+        lines.push_back(line);
+    }
+    EXPECT_EQ(TakeTransfers(), lines);
+    const std::pair<std::size_t, const char*> reads[] = {{1, "C4@0 00 01 10 C0 00 40 00 00|in [64]"},
+                                                         {64, "C4@0 00 01 10 C0 00 40 00 00|in [64]"},
+                                                         {65, "C4@0 00 01 10 C0 00 80 00 00|in [128]"}};
+    for (const auto& [wanted, wire] : reads) {
+        Bytes read(wanted);
+        driver_.Script(In(), {.data = Counting(wanted <= 64 ? 64 : 128, 7)});
+        instrument.ReadEEPROM(0x110C0, read);
+        EXPECT_EQ(read, Counting(wanted, 7));
+        ExpectOnTheWire(wire);
+    }
+    Bytes nothing, tooMuch(0x10000);
+    EXPECT_THROW(instrument.ReadEEPROM(0, nothing), InvalidArgumentException);
+    EXPECT_THROW(instrument.ReadEEPROM(0, tooMuch), InvalidArgumentException);
+    EXPECT_THROW(instrument.DownloadFirmware(0, nothing, true), InvalidArgumentException);
+    EXPECT_THROW(instrument.DownloadFirmware(0, tooMuch, false), InvalidArgumentException);
+    EXPECT_THAT(TakeTransfers(), IsEmpty());
+    EXPECT_NO_THROW(instrument.DownloadFirmware(0, Bytes(0xFFFF), false));
+    EXPECT_THROW(PellandoFunctionality{Pointer()}, NullPointerException);
+}
+
+/// The native driver's record keeps its bytes from one command to the next, and so they are sent.
+TEST_P(Commands, SendWhatEarlierCommandsLeftOverTheNativeDriverOnly) {
+    const bool isNative = IsNative();
+    PellandoFunctionality& instrument = Open();
+    std::uint16_t value = 0;
+    instrument.Reset(0x771F);
+    const struct {
+        Bytes answer;
+        std::uint16_t native, usbIo;
+    } answers[] = {{{}, 0x1F1F, 0}, {{31, 32}, 0x1F20, 0x1F20}, {{0x77}, 0x7720, 0x7700}};
+    for (const auto& row : answers) {
+        driver_.Script(0, {.data = row.answer});
+        instrument.ReadCPLD(value);
+        EXPECT_EQ(value, isNative ? row.native : row.usbIo);
+    }
+    driver_.Script(0, {.data = Counting(8, 0xA1)});
+    instrument.GetMeasureParameters(a, b, c, m[0], m[1]);
+    TakeTransfers();
+    instrument.SetMeasureParameters(0, 0, 0, 0);
+    ExpectOnTheWire(isNative ? "C1@0 00 00 00 00 00 00 00 A8" : "C1@0 00 00 00 00 00 00 00 00");
+    instrument.DownloadFirmware(0x1234, Bytes(1), false);
+    TakeTransfers();
+    instrument.SetMeasureMode(1);
+    ExpectOnTheWire(isNative ? "CF@1234 01" : "CF@0 01");
 }
 
 TEST_P(Commands, EndWithTheTransferThatFails) {
     const ErrorCode stall = IsNative() ? Errors::GeneralFailure : EndpointHalted;
-    std::array<std::uint8_t, 64> buffer{};
-    const auto write = [&](I& i) { i.WriteEEPROM({}, {}, buffer.data(), 64); };
-    const auto read = [&](I& i) { i.ReadEEPROM({}, {}, buffer.data(), 64); };
-    const auto update = [&](I& i) { i.DownloadEEPROMFirmware({}, {}, buffer.data(), 64); };
-    struct Failure {
-        const char* nativeText;
-        const char* usbIoName;
-    };
-    const Failure outward{"Device IO control failed: ", "ClassOrVendorOutRequest"},
-        inward{"Device IO control failed: ", "ClassOrVendorInRequest"},
-        reading{"read data failed", "ReadSync"}, writing{"write data failed", "WriteSync"};
+    Bytes buffer(65);
+    const auto write = [&](I& i) { i.WriteEEPROM(0, buffer); };
+    const auto read = [&](I& i) { i.ReadEEPROM(0, buffer); };
     const struct {
         const char* name;
-        Failure failure;
+        const char* usbIoName;  ///< of the operation that fails
         std::uint32_t place;
         std::size_t failing;  ///< of the transfers of this place; all behind one control
         std::function<void(I&)> run;
     } cases[] = {
-        {"out", outward, 0, 0, [](I& i) { i.SetMeasureMode(1); }},
-        {"in", inward, 0, 0, [&](I& i) { i.GetChipID(buffer.data()); }},
-        {"measure", outward, 0, 0, [&](I& i) { i.MeasureRequest(buffer.data(), 64, 1); }},
-        {"scan", outward, 0, 0, [](I& i) { i.StartScan(5, 1, 0); }},
-        {"counted scan", outward, 0, 0, [](I& i) { i.StartScan(5, 1, 100); }},
-        {"read", outward, 0, 0, read},
-        {"read, data", reading, In(), 0, read},
-        {"firmware", outward, 0, 0, update},
-        {"write", outward, 0, 0, write},
-        {"write, data", writing, Out(), 0, write},
-        {"write, first byte behind", writing, Out(), 1, write},
-        {"write, second byte behind", writing, Out(), 2, write},
+        {"out", "ClassOrVendorOutRequest", 0, 0, write},
+        {"in", "ClassOrVendorInRequest", 0, 0, [](I& i) { i.ReadCPLD(a); }},
+        {"measure", "ClassOrVendorOutRequest", 0, 0, [&](I& i) { i.MeasureRequest(buffer.data(), 64, 1); }},
+        {"scan", "ClassOrVendorOutRequest", 0, 0, [](I& i) { i.StartScan(5, 1, 0); }},
+        {"read, data", "ReadSync", In(), 0, read},
+        {"write, data", "WriteSync", Out(), 0, write},
+        {"write, first byte behind", "WriteSync", Out(), 1, write},
+        {"write, second byte behind", "WriteSync", Out(), 2, write},
     };
-    const auto instrument = Open();
+    PellandoFunctionality& instrument = Open();
     for (const auto& row : cases) {
         SCOPED_TRACE(row.name);
         for (std::size_t i = 0; i < row.failing; ++i) {
             driver_.Script(row.place, {});
         }
         driver_.Script(row.place, {.code = stall, .after = 3});
+        const std::string nativeText = row.place == 0      ? "Device IO control failed: "
+                                       : row.place == In() ? "read data failed"
+                                                           : "write data failed";
         ExpectThrow<IOException>(IsNative()
-                                     ? row.failure.nativeText + ErrorSuffix(stall)
-                                     : std::string("Error in UsbIo function: \"") + row.failure.usbIoName +
+                                     ? nativeText + ErrorSuffix(stall)
+                                     : std::string("Error in UsbIo function: \"") + row.usbIoName +
                                            "\" Error: Error code 0xE0000030: USBD Error: Endpoint halted.",
-                                 [&] { row.run(*instrument); });
+                                 [&] { row.run(instrument); });
         EXPECT_EQ(TakeTransfers().size(), row.place == 0 ? 1 : row.failing + 2)
             << "nothing follows a failure";
+        EXPECT_EQ(buffer.size(), 65U);
     }
 }
 
-TEST_P(Commands, WaitTheirTimeForData) {
-    std::array<std::uint8_t, 64> buffer{};
-    const auto instrument = Open();
-    const auto expectFailureAfter = [&](std::uint64_t milliseconds, const std::function<void()>& command) {
-        driver_.TakeTranscript();
-        const Stopwatch watch(clock_);
-        ExpectThrow<IOException>(
-            IsNative()
-                ? "read data failed" + ErrorSuffix(Errors::IoIncomplete)
-                : "Error in UsbIo function: \"ReadSync\" Error: Error code 0xE000100C: The request has "
-                  "been timed out.",
-            command);
-        watch.Expect(1 + milliseconds);
-        EXPECT_EQ(driver_.Running(In()), 0U);
+TEST_P(Commands, GiveTheirTransfersTheirTime) {
+    Bytes buffer(256);
+    const auto write = [&](I& i) { i.WriteEEPROM(0, buffer); };
+    constexpr std::uint64_t noEnd = 0;
+    const struct {
+        const char* name;
+        std::function<void(I&)> run;
+        std::uint32_t place;
+        std::size_t answeredBefore;
+        std::uint64_t native, usbIo;  ///< milliseconds
+    } cases[] = {
+        {"measure", [&](I& i) { i.MeasureRequest(buffer.data(), 64, 2); }, In(), 0, 2000 + 5000, 2000 + 5000},
+        {"read", [&](I& i) { i.ReadEEPROM(0, buffer); }, In(), 0, 256 + 5000, 256 + 5000},
+        {"write", write, Out(), 0, 2560 + 5000, noEnd},
+        {"end of a write", write, Out(), 2, 5000, noEnd},
+        {"scan", [](I& i) { i.StartScan(5, 2, 0); }, In(), 0, 2000 + 3000, 256 * 15 + 5000},
+        {"counted scan", [](I& i) { i.StartScan(5, 2, 770); }, In(), 0, 2000 + 3000, 3 * 15 + 5000},
     };
-    expectFailureAfter(2000 + 5000, [&] { instrument->MeasureRequest(buffer.data(), 64, 2); });
-    expectFailureAfter(64 + 5000, [&] { instrument->ReadEEPROM({}, {}, buffer.data(), 64); });
+    PellandoFunctionality& instrument = Open();
+    for (const auto& row : cases) {
+        SCOPED_TRACE(row.name);
+        const std::uint64_t expected = IsNative() ? row.native : row.usbIo;
+        if (expected == noEnd) {
+            continue;
+        }
+        for (std::size_t i = 0; i < row.answeredBefore; ++i) {
+            driver_.Script(row.place, {});
+        }
+        driver_.Script(row.place, {.after = Never});
+        const Stopwatch watch(clock_);
+        EXPECT_THROW(row.run(instrument), IOException);
+        watch.Expect(1 + expected);
+        EXPECT_EQ(driver_.Running(row.place), 0U);
+    }
 }
 
 TEST_P(Commands, ScanAtRaisedPriorityAndGiveItBack) {
-    const auto instrument = Open();
+    PellandoFunctionality& instrument = Open();
     const int before = CurrentThreadPriority();
     const int raised = [] {
         const ScopedThreadPriority highest(HighestThreadPriority);
         return CurrentThreadPriority();  // where the system refuses a level, it stays as it was
     }();
-    for (const ErrorCode code : {Errors::Success, Errors::GeneralFailure}) {
-        int during = -99;
-        driver_.Script(In(), {.data = Counting(5, 1), .code = code, .after = 1, .onStart = [&] {
-                                  during = CurrentThreadPriority();
-                              }});
-        try {
-            instrument->StartScan(5, 1, IsNative() ? 5 : 1000);
-            EXPECT_EQ(code, Errors::Success);
-        } catch (const IOException&) {
-            EXPECT_NE(code, Errors::Success);
-        }
-        EXPECT_EQ(during, raised);
-        EXPECT_EQ(CurrentThreadPriority(), before);
+    int during = -99;
+    driver_.Script(
+        In(), {.data = Counting(5, 1), .after = 1, .onStart = [&] { during = CurrentThreadPriority(); }});
+    instrument.StartScan(5, 1, IsNative() ? 5 : 1000);
+    EXPECT_EQ(during, raised);
+    EXPECT_EQ(CurrentThreadPriority(), before);
+}
+
+TEST_P(Commands, PassMessagesOnUntilTheListenerIsRemoved) {
+    PellandoFunctionality& instrument = Open();
+    for (const bool isRemoved : {false, true}) {
+        SleepMilliseconds(50);  // an interrupt just after the opening is thrown away
+        EXPECT_TRUE(driver_.Complete(Interrupts(), {.data = {1}}));
+        SleepMilliseconds(50);
+        EXPECT_THAT(listener_.Codes(), ElementsAre(MessageButtonData)) << isRemoved;
+        instrument.removeListener(&listener_);
     }
+}
+
+TEST_P(Commands, NameTheInstrumentThatIsNotThere) {
+    for (const auto& [count, index] : {std::pair{0U, 0U}, {2U, 2U}, {2U, 0xFFFFFFFFU}}) {
+        ScriptedDriver driver(Paths(count));
+        const ScopedDeviceFiles files(driver);
+        ExpectThrow<IOException>(
+            IsNative() && count == 0 ? "No devices connected" : "No such device connected",
+            [index = index] { PellandoFunctionality(nullptr, index); });
+    }
+}
+
+class NativeCommands : public NativeTest {
+  protected:
+    Bytes NextRecord(std::uint32_t size) {
+        Bytes buffer(size);
+        instrument_.GetScanData(buffer.data(), size);
+        buffer.resize(size);
+        return buffer;
+    }
+    /// A scan of so many bytes, counted from `first` on.
+    void Scan(std::size_t bytes, unsigned first) {
+        driver_.Script(1, {.data = Counting(bytes, first)});
+        instrument_.StartScan(5, 1, static_cast<std::uint32_t>(bytes));
+    }
+    PellandoFunctionality instrument_{Pointer(new PellandoFunctionality_PC(nullptr, 0))};
+};
+
+TEST_F(NativeCommands, HandOutTheRecordsOfAScan) {
+    Scan(20, 1);
+    EXPECT_EQ(NextRecord(5), Counting(5, 1));
+    EXPECT_EQ(NextRecord(3), Counting(3, 6)) << "a smaller buffer takes the record's beginning";
+    EXPECT_EQ(NextRecord(8), Counting(5, 11)) << "a larger one gets no more than the record holds";
+    Scan(10, 0x71);
+    EXPECT_EQ(NextRecord(5), Counting(5, 0x71)) << "a new scan begins with an empty list";
+    EXPECT_EQ(NextRecord(5), Counting(5, 0x76));
+    EXPECT_THAT(NextRecord(5), IsEmpty());
+    driver_.Script(1, {.data = Counting(10, 1)});
+    ExpectThrow<IOException>("Read data failed (OverlappedRead)", [&] { instrument_.StartScan(5, 1, 0); });
+    EXPECT_THAT(NextRecord(5), IsEmpty()) << "what came before the failure is discarded";
 }
 
 }  // namespace

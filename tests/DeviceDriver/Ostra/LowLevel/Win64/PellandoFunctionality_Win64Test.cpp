@@ -1,42 +1,51 @@
+#include <atomic>
+#include <memory>
+#include <optional>
+
+#include "DeviceDriver/Ostra/LowLevel/Win64/PellandoFunctionality_Win64.h"
 #include "Platform/CallFilter.h"
+#include "Platform/HostQueries.h"
+#include "Platform/Time.h"
+#include "Protocol/Instrument.h"
 #include "Protocol/UsbIoDriver.h"
-#include "UsbIoTest.h"
+#include "Support/DriverTest.h"
 
 namespace Varnholt::Tests {
 namespace {
 
 using namespace Protocol::UsbIoDriver;
-using DeviceDriver::Ostra::LowLevel::Bytes2;
 using DeviceDriver::Ostra::LowLevel::PellandoFunctionality_Win64;
+using DeviceDriver::Ostra::LowLevel::ScanReceiver;
 using Protocol::BulkInEndpoint;
-using testing::ElementsAre;
 using testing::ElementsAreArray;
 
-using UsbIoCommands = UsbIoTest;
-
-TEST_F(UsbIoCommands, GiveShortAnswersAsTheyCame) {
-    const auto instrument = Open();
-    Bytes2 value{};
-    driver_.Script(Control::ClassOrVendorInRequest, {.data = {31, 32}, .after = 1});
-    instrument->ReadCPLD(value);
-    driver_.Script(Control::ClassOrVendorInRequest, {.data = {0x77}, .after = 1});
-    instrument->ReadCPLD(value);
-    EXPECT_THAT(value, ElementsAre(0x77, 0)) << "zeros, not what an earlier command had";
-
-    Bytes buffer(5, 0xEE);
-    driver_.Script(BulkInEndpoint, {.data = {9, 8, 7}, .after = 3});
-    instrument->MeasureRequest(buffer.data(), 4, 1);
-    EXPECT_THAT(buffer, ElementsAre(9, 8, 7, 0xEE, 0xEE));
-}
-
-class UsbIoOpening : public UsbIoTest {
+/// A host on which USBIO is the transport.
+class UsbIoTest : public DriverTest {
   protected:
-    UsbIoOpening() : UsbIoTest({"usbio/1", "usbio/2", "usbio/3"}) {}
+    UsbIoTest() : DriverTest(TestTime::RealForThreadSanitizer, {"usbio/1", "usbio/2", "usbio/3"}) {
+        Platform::Override64BitHost(true);
+    }
+    ~UsbIoTest() override {
+        Platform::InstallCallFilter({});
+        Platform::Override64BitHost(std::nullopt);
+        EXPECT_EQ(driver_.OpenFiles(), 0U);
+    }
 
-    static void ExpectFailure(const std::string& text, std::uint32_t index) {
+    /// What happened since the last call, without the interrupt listener's reads.
+    Lines TakeTranscript() {
+        Lines lines = driver_.TakeTranscript();
+        std::erase_if(lines, [](const std::string& line) {
+            return line.starts_with("read 84") || line.starts_with("cancel 84");
+        });
+        return lines;
+    }
+    void ExpectFailure(const std::string& text, std::uint32_t index) {
         ExpectThrow<IOException>(text, [index] { PellandoFunctionality_Win64 instrument(nullptr, index); });
+        EXPECT_EQ(driver_.OpenFiles(), 0U) << text;
     }
 };
+
+using UsbIoOpening = UsbIoTest;
 
 TEST_F(UsbIoOpening, ConfiguresTheInstrumentThatWasAskedFor) {
     std::string configuration = " 00 00 01 00 00 00 00 00 00 00 01 00";
@@ -45,79 +54,203 @@ TEST_F(UsbIoOpening, ConfiguresTheInstrumentThatWasAskedFor) {
     }
     const std::string ask = "control 8094206C / [12]";
     Lines expected;
-    for (const char* const listed :
+    for (const std::string listed :
          {"usbio/1", "usbio/2", "usbio/3", "usbio/1"}) {  // the last one: the search
-        expected.insert(expected.end(), {std::string("open ") + listed, ask, std::string("close ") + listed});
+        expected.insert(expected.end(), {"open " + listed, ask, "close " + listed});
     }
     expected.insert(expected.end(),
                     {"open usbio/2", ask, "control 80942028 /", "control 80942024" + configuration + " /",
-                     "control 8094203C / [8]", "control 80942040 11 00 00 00 00 00 00 00 /", "open usbio/2",
-                     ask, "control 80942078 03 /", "open usbio/2", ask, "control 80942078 82 /",
-                     "open usbio/2", ask, "control 80942078 84 /"});
+                     "control 8094203C / [8]", "control 80942040 11 00 00 00 00 00 00 00 /"});
+    for (const std::string endpoint : {"03", "82", "84"}) {
+        expected.insert(expected.end(), {"open usbio/2", ask, "control 80942078 " + endpoint + " /"});
+    }
     PellandoFunctionality_Win64 instrument(nullptr, 1);
     EXPECT_THAT(TakeTranscript(), ElementsAreArray(expected));
-    EXPECT_EQ(driver_.OpenFiles(), 4U);
     std::string identifier;
     instrument.GetDeviceIdentifier(identifier);
     EXPECT_EQ(identifier, "usbio/2");
 }
 
-TEST_F(UsbIoOpening, FailsWithoutTheInstrument) {
-    ExpectFailure("No such device connected", 3);
-    {
-        ScriptedDriver none(Lines{});
-        const Platform::ScopedDeviceFiles over(none);
-        ExpectFailure("No such device connected", 0);
+TEST_F(UsbIoOpening, EachOfItsStepsCanFail) {
+    const std::pair<const char*, std::uint32_t> steps[] = {
+        {"UnconfigureDevice", Control::UnconfigureDevice},
+        {"SetConfiguration", Control::SetConfiguration},
+        {"GetDeviceParameters", Control::GetDeviceParameters},
+        {"SetDeviceParameters", Control::SetDeviceParameters},
+        {"BindTX", Control::BindPipe},
+        {"BindRX", Control::BindPipe},
+        {"BindIR", Control::BindPipe},
+    };
+    int bindings = 0;
+    for (const auto& [operation, code] : steps) {
+        for (int i = 0; i < bindings; ++i) {
+            driver_.Script(code, {});
+        }
+        bindings += code == Control::BindPipe ? 1 : 0;
+        driver_.Script(code, {.code = Status::AlreadyConfigured});
+        ExpectFailure(std::string("Error in UsbIo function: \"") + operation +
+                          "\" Error: Error code 0xE0001005: USB device is already configured.",
+                      0);
     }
     // The search stops at the first device that does not open.
-    const auto failOpen = [this](int after) {
-        for (int i = 0; i < after; ++i) {
+    for (const auto& [opened, text] :
+         {std::pair{1, "No such device connected"}, {3, "requested device not found"}}) {
+        for (int i = 0; i < opened; ++i) {
             driver_.Script(Control::GetDriverInfo, {.data = {0x30, 0x02}});
         }
         driver_.Script(Control::GetDriverInfo, {.code = 31});
+        ExpectFailure(text, 1);
+    }
+    const auto failCall = [](std::string_view which, int time) {
+        Platform::InstallCallFilter([which, time](std::string_view call) mutable {
+            return call == which && --time == 0 ? Platform::Errors::NoSystemResources
+                                                : Platform::Errors::Success;
+        });
     };
-    failOpen(3);
-    ExpectFailure("requested device not found", 1);
-    failOpen(1);
-    ExpectFailure("No such device connected", 1);
-
-    Platform::InstallCallFilter([lists = 0](std::string_view call) mutable {
-        return call == "MakeList" && ++lists == 2 ? Platform::Errors::InvalidData : Platform::Errors::Success;
-    });
+    failCall("MakeList", 2);
     ExpectFailure("Unable to create device list.", 0);
-    Platform::InstallCallFilter({});
+    failCall("StartThread", 1);
+    ExpectFailure("could not create interrupt listener thread", 0);
 }
 
-TEST_F(UsbIoOpening, EachStepOfTheConfigurationCanFail) {
-    struct Case {
-        const char* operation;
-        std::uint32_t code;
-        int before;
-    };
-    const Case cases[] = {
-        {"UnconfigureDevice", Control::UnconfigureDevice, 0},
-        {"SetConfiguration", Control::SetConfiguration, 0},
-        {"GetDeviceParameters", Control::GetDeviceParameters, 0},
-        {"SetDeviceParameters", Control::SetDeviceParameters, 0},
-        {"BindTX", Control::BindPipe, 0},
-        {"BindRX", Control::BindPipe, 1},
-        {"BindIR", Control::BindPipe, 2},
-    };
-    for (const Case& row : cases) {
-        for (int i = 0; i < row.before; ++i) {
-            driver_.Script(row.code, {});
-        }
-        driver_.Script(row.code, {.code = Status::AlreadyConfigured});
-        ExpectFailure(std::string("Error in UsbIo function: \"") + row.operation +
-                          "\" Error: Error code 0xE0001005: USB device is already configured.",
-                      0);
-        EXPECT_EQ(driver_.OpenFiles(), 0U) << row.operation;
+constexpr std::uint32_t Whole = 65536;
+
+/// Bytes of a stream, different from one 256-byte record to the next.
+Bytes Stream(std::size_t count) {
+    Bytes bytes(count);
+    for (std::size_t place = 0; place < count; ++place) {
+        bytes[place] = static_cast<std::uint8_t>(place * 7 + place / 256 * 13);
     }
-    Platform::InstallCallFilter([](std::string_view call) {
-        return call == "StartThread" ? Platform::Errors::NoSystemResources : 0;
-    });
-    ExpectFailure("could not create interrupt listener thread", 0);
-    Platform::InstallCallFilter({});
+    return bytes;
+}
+
+class UsbIoScan : public UsbIoTest {
+  protected:
+    UsbIoScan() {
+        Platform::ObserveBeeps([this](std::uint32_t hertz, std::uint32_t milliseconds) {
+            beeps_ += hertz == 2140 && milliseconds == 75 ? 1 : 1000;
+            Platform::SignalEvent(beeped_.Get());
+        });
+        TakeTranscript();
+    }
+    ~UsbIoScan() override { Platform::ObserveBeeps({}); }
+
+    /// The instrument sends the stream in transfers of these sizes, one after the other.
+    void Send(const std::vector<std::uint32_t>& sizes, std::uint32_t after) {
+        std::size_t sent = 0;
+        for (const std::uint32_t size : sizes) {
+            const Bytes all = Stream(sent + size);
+            driver_.Script(
+                BulkInEndpoint,
+                {.data = Bytes(all.begin() + static_cast<std::ptrdiff_t>(sent), all.end()), .after = after});
+            sent += size;
+        }
+    }
+    Bytes TakeAll(std::uint32_t piece = 256) {
+        Bytes all, part(piece);
+        for (std::uint32_t size = piece; size != 0;) {
+            instrument_.GetScanData(part.data(), &size);
+            all.insert(all.end(), part.data(), part.data() + size);
+        }
+        return all;
+    }
+    void ExpectRefusal(const std::string& text, std::uint32_t total) {
+        ExpectThrow<DataException>(text, [&] { instrument_.StartScan(256, 1, total); });
+        EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
+        EXPECT_EQ(TakeAll(), Bytes());
+    }
+
+    std::atomic<int> beeps_ = 0;
+    Platform::OwnedHandle beeped_{Platform::MakeAutoResetEvent()};
+    PellandoFunctionality_Win64 instrument_{nullptr, 0};
+};
+
+TEST_F(UsbIoScan, FixedScansEndWithTheirSizeOrAShortTransfer) {
+    const struct {
+        const char* name;
+        std::uint32_t total;
+        std::vector<std::uint32_t> transfers;  ///< what the instrument sends
+        Lines reads;                           ///< what it is asked for
+        std::uint32_t end;
+    } cases[] = {
+        {"two transfers", 100000, {Whole, 34464, 0}, {"65536", "34464", "0", "0"}, 100000},
+        {"short", 100000, {Whole, 4464}, {"65536", "34464", "0"}, 70000},
+        {"short at once", 100000, {10}, {"65536", "34464"}, 10},
+        {"empty at once", 100000, {0}, {"65536", "34464"}, 0},
+        {"one byte", 1, {1, 0}, {"1", "0", "0"}, 1},
+        {"a whole transfer", Whole, {Whole, 0}, {"65536", "0", "0"}, Whole},
+        {"a byte more", Whole + 1, {Whole, 1, 0}, {"65536", "1", "0", "0"}, Whole + 1},
+    };
+    for (const std::uint32_t after : {0U, 1U}) {
+        for (const auto& row : cases) {
+            SCOPED_TRACE(row.name);
+            driver_.DropScript(BulkInEndpoint);
+            TakeTranscript();
+            Send(row.transfers, after);
+            instrument_.StartScan(256, 1, row.total);
+            Lines expected{"control 80942035 00 00 00 00 02 00 00 00 00 00 00 00 00 C0 00 00 00 00 /"};
+            for (const std::string& size : row.reads) {
+                expected.push_back("read 82 [" + size + "]");
+            }
+            expected.emplace_back("cancel 82");
+            EXPECT_THAT(TakeTranscript(), ElementsAreArray(expected));
+            EXPECT_EQ(TakeAll(), Stream(row.end));
+            EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
+        }
+    }
+    EXPECT_EQ(beeps_, 0);
+}
+
+TEST_F(UsbIoScan, OpenEndedScansGrowAndBeepOnceEach) {
+    int beeps = 0;
+    for (const std::uint32_t total : {0U, Whole, 1280000U, 2000000U}) {
+        std::vector<std::uint32_t> transfers(total / Whole, Whole);
+        transfers.push_back(total % Whole);
+        Send(transfers, total % 3);
+        const Stopwatch stopwatch(clock_);
+        instrument_.StartScan(256, 1, 0);
+        EXPECT_LT(stopwatch.Milliseconds(), 300U) << "a scan does not wait for its beep";
+        EXPECT_EQ(TakeAll(100000), Stream(total)) << total;
+        EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
+        ASSERT_EQ(Platform::Wait(beeped_.Get(), 10000), Platform::WaitResult::Signalled);
+        stopwatch.ExpectBetween(370, 372);
+        EXPECT_EQ(beeps_, ++beeps);
+    }
+}
+
+TEST_F(UsbIoScan, AFailureEndsAScanAndLeavesNothing) {
+    for (const Answer& answer :
+         {Answer{.code = Status::EndpointHalted, .after = 3}, Answer{.refusal = Status::EndpointHalted}}) {
+        Send({Whole}, 1);
+        driver_.Script(BulkInEndpoint, answer);
+        ExpectThrow<IOException>(
+            "Error in UsbIo function: \"WaitForCompletion1\" Error: Error code 0xE0000030: USBD Error: "
+            "Endpoint halted.",
+            [&] { instrument_.StartScan(256, 1, 3 * Whole); });
+        EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
+        EXPECT_EQ(TakeAll(), Bytes());
+    }
+}
+
+/// No driver should report more than a read asked for; where one does, a fixed scan stays within its size.
+TEST_F(UsbIoScan, MoreThanWasAskedForIsRefused) {
+    const Answer tooMuch{.data = Bytes(100), .after = 1, .count = 101};
+    driver_.Script(BulkInEndpoint, tooMuch);
+    ExpectRefusal("buffer size is fix", 100);
+    Send({5000, 0}, 1);
+    instrument_.StartScan(256, 1, 5000);
+    driver_.Script(BulkInEndpoint, tooMuch);
+    ExpectRefusal("more bytes read than expected", 100);  // now there would be room for it
+
+    struct : ScanReceiver {
+        void Receive(std::span<const std::uint8_t> data) override { received += data.size(); }
+        std::size_t received = 0;
+    } receiver;
+    instrument_.SetScanReceiver(&receiver);
+    Send({Whole}, 1);
+    driver_.Script(BulkInEndpoint, tooMuch);
+    ExpectRefusal("more bytes read than expected", Whole + 100);
+    EXPECT_EQ(receiver.received, Whole);
 }
 
 }  // namespace
