@@ -10,6 +10,7 @@
 #include "DeviceDriver/Ostra/LowLevel/PellandoLog.h"
 #include "DeviceDriver/Ostra/LowLevel/SectionReader.h"
 #include "FakeCommands.h"
+#include "FreshEeprom.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
 
@@ -36,7 +37,7 @@ struct Model {
 
 /// The image of a fresh instrument; its table is filled up with entries that mean nothing to anybody.
 Bytes FreshImageWith(std::uint16_t entries) {
-    Bytes image = FreshImage();
+    Bytes image = Simulator::FreshEeprom();
     std::uint8_t* const header = &image[EepromMap::Table];
     for (std::uint16_t i = FreshEntries; i < entries; ++i) {
         std::uint8_t* const entry =

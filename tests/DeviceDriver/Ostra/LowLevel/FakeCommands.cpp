@@ -4,13 +4,10 @@
 #include <utility>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
-#include "DeviceDriver/Ostra/LowLevel/PellandoEAT.h"
 #include "Protocol/ByteOrder.h"
-#include "Protocol/EepromMap.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
-namespace EepromMap = Protocol::EepromMap;
 using Generic::Utilities::IOException;
 using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Tools::SmartPointer;
@@ -58,26 +55,18 @@ class FakeCommands final : public PellandoFunctionalityByte {
                         std::uint8_t& m5, std::uint8_t& m6) override {
         Receive("GetMeasureMode");
         const auto answers = instrument_.describeMode(instrument_.mode);
-        m1 = answers[0];
-        m2 = answers[1];
-        m3 = answers[2];
-        m4 = answers[3];
-        m5 = answers[4];
-        m6 = answers[5];
+        std::size_t next = 0;
+        for (std::uint8_t* const value : {&m1, &m2, &m3, &m4, &m5, &m6}) {
+            *value = answers[next++];
+        }
     }
     void WriteEEPROM(const Bytes4& address, const Bytes2& length, const std::uint8_t* data,
                      std::uint32_t count) override {
-        const std::uint32_t start = Protocol::LoadBig32(address.data());
-        RefuseOutside(start, count, Number(length));
-        Receive("WriteEEPROM", start, count);
-        std::copy_n(data, count, instrument_.eeprom.begin() + static_cast<std::ptrdiff_t>(start));
+        std::copy_n(data, count, Place("WriteEEPROM", address, length, count));
     }
     void ReadEEPROM(const Bytes4& address, const Bytes2& length, std::uint8_t* data,
                     std::uint32_t count) override {
-        const std::uint32_t start = Protocol::LoadBig32(address.data());
-        RefuseOutside(start, count, Number(length));
-        Receive("ReadEEPROM", start, count);
-        std::copy_n(instrument_.eeprom.begin() + static_cast<std::ptrdiff_t>(start), count, data);
+        std::copy_n(Place("ReadEEPROM", address, length, count), count, data);
     }
     void GetMISC(std::uint8_t& m1, Bytes2& m2, std::uint8_t& m3, Bytes2& m4, Bytes2& m5) override {
         Receive("GetMISC");
@@ -88,31 +77,13 @@ class FakeCommands final : public PellandoFunctionalityByte {
         Protocol::StoreBig16(m5.data(), instrument_.misc5);
     }
     void Reset(const Bytes2& code) override { Receive("Reset", Number(code)); }
-    void WriteCPLD(const Bytes2& c1, const Bytes2& c2, const Bytes2& c3) override {
-        Receive("WriteCPLD");
-        instrument_.cpld = {Number(c1), Number(c2), Number(c3)};
-    }
-    void ReadCPLD(Bytes2& value) override {
-        Receive("ReadCPLD");
-        Protocol::StoreBig16(value.data(), instrument_.cpld[0]);
-    }
-    void DownloadRAMFirmware(std::uint16_t address, const std::uint8_t*, std::uint32_t count) override {
-        Receive("DownloadRAMFirmware", address, count);
-    }
-    void DownloadEEPROMFirmware(const Bytes4& address, const Bytes2& length, const std::uint8_t*,
-                                std::uint32_t count) override {
-        RefuseOutside(0, count, Number(length));
-        Receive("DownloadEEPROMFirmware", Protocol::LoadBig32(address.data()), count);
-    }
-    void GetScanData(std::uint8_t* buffer, std::uint32_t* size) override {
-        Receive("GetScanData", 0, *size);
-        *size = std::min(*size, static_cast<std::uint32_t>(instrument_.scan.size()));
-        std::copy_n(instrument_.scan.begin(), *size, buffer);
-        instrument_.scan.erase(instrument_.scan.begin(),
-                               instrument_.scan.begin() + static_cast<std::ptrdiff_t>(*size));
-    }
 
     // What nobody asks it for.
+    void WriteCPLD(const Bytes2&, const Bytes2&, const Bytes2&) override {}
+    void ReadCPLD(Bytes2&) override {}
+    void DownloadRAMFirmware(std::uint16_t, const std::uint8_t*, std::uint32_t) override {}
+    void DownloadEEPROMFirmware(const Bytes4&, const Bytes2&, const std::uint8_t*, std::uint32_t) override {}
+    void GetScanData(std::uint8_t*, std::uint32_t*) override {}
     void RemoveListener(Generic::EventListener*) override {}
     void StartScan(std::uint32_t, std::uint32_t, std::uint32_t) override {}
     void MeasureRequest(std::uint8_t*, std::uint32_t, std::uint32_t) override {}
@@ -126,11 +97,14 @@ class FakeCommands final : public PellandoFunctionalityByte {
             throw IOException("the fake fails", Here());
         }
     }
-    void RefuseOutside(std::uint32_t start, std::uint32_t count, std::uint32_t length) const {
+    std::uint8_t* Place(const char* name, const Bytes4& address, const Bytes2& length, std::uint32_t count) {
+        const std::uint32_t start = Protocol::LoadBig32(address.data());
         if (start > instrument_.eeprom.size() || count > instrument_.eeprom.size() - start ||
-            count != length) {
+            count != Number(length)) {
             throw std::logic_error("EEPROM transfer outside the EEPROM");
         }
+        Receive(name, start, count);
+        return instrument_.eeprom.data() + start;
     }
 
     FakeInstrument& instrument_;
@@ -143,18 +117,6 @@ SmartPointer<PellandoFunctionality> Open(FakeInstrument& instrument) {
     const SmartPointer<PellandoFunctionality> functionality(new PellandoFunctionality(transport));
     instrument.commands.clear();
     return functionality;
-}
-
-Bytes FreshImage() {
-    PellandoEAT table;
-    table.InitializeEmtpyEAT();
-    Bytes image(Protocol::EepromSize, 0xFF);
-    const auto at = [&image](std::ptrdiff_t address) { return image.begin() + address; };
-    PellandoEAT::GetDefaultLogData().Dump(at(EepromMap::MainLog), image.end(), true, true);
-    PellandoEAT::GetDefaultLogData().Dump(at(EepromMap::LogCopy), image.end(), true, true);
-    table.Dump(at(EepromMap::Table), at(EepromMap::Calibration));
-    PellandoEAT::GetDefaultCalibrationData().Dump(at(EepromMap::Calibration), image.end(), true, true);
-    return image;
 }
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

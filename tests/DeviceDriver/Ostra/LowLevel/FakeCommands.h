@@ -13,8 +13,7 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 using Bytes = std::vector<std::uint8_t>;
 
-/// One command as it reached the fake; for commands that have neither address nor size, what number they
-/// have.
+/// One command as it reached the fake; the number of a mode or a reset stands in the place of an address.
 struct Command {
     std::string name;
     std::uint32_t address = 0;
@@ -33,8 +32,6 @@ struct FakeInstrument {
     std::uint8_t misc1 = 0, misc3 = 0;
     std::uint16_t misc2 = 0, misc4 = 0, misc5 = 0;
     std::uint8_t mode = 0;
-    std::array<std::uint16_t, 3> cpld{};
-    Bytes scan{};  ///< what is left of it
     /// The six answers to `GetMeasureMode` in the current mode.
     std::function<std::array<std::uint8_t, 6>(std::uint8_t mode)> describeMode{};
 
@@ -46,8 +43,5 @@ struct FakeInstrument {
 
 /// A command set whose transport is the fake; its opening reset is not among the commands.
 Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionality> Open(FakeInstrument& instrument);
-
-/// The EEPROM of a fresh instrument: table, default values, both logs zero.
-Bytes FreshImage();
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

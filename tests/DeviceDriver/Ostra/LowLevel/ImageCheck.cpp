@@ -6,6 +6,7 @@
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
 #include "FakeCommands.h"
+#include "FreshEeprom.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
 
@@ -114,7 +115,7 @@ ImageOutcome CheckImage(const Bytes& image, const std::vector<Resize>& resizes) 
 }
 
 ImageOutcome CheckRecords(const std::uint8_t* records, std::size_t size) {
-    static const Bytes fresh = FreshImage();
+    static const Bytes fresh = Simulator::FreshEeprom();
     static const std::vector<std::uint16_t> ids = [] {
         std::vector<std::uint16_t> all;
         for (const Properties* set :
