@@ -1,6 +1,5 @@
 // What the instrument's own driver and the USBIO driver have in common, each with its own controls and codes.
 #include "Platform/Drivers/DriverFixture.h"
-#include "Service/InterruptibleDeviceFiles.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -10,7 +9,6 @@ namespace Native = Protocol::NativeDriver;
 namespace UsbIo = Protocol::UsbIoDriver;
 using Platform::ErrorCode;
 using Platform::Handle;
-using Platform::Usb::TransferStatus;
 using Protocol::BulkInEndpoint;
 using Protocol::BulkOutEndpoint;
 using Protocol::InterruptInEndpoint;
@@ -21,8 +19,6 @@ class EitherDriver : public DriverFixture, public testing::WithParamInterface<Ki
   protected:
     bool IsNative() const { return GetParam() == Kind::Native; }
     ErrorCode Code(ErrorCode native, ErrorCode usbIo) const { return IsNative() ? native : usbIo; }
-    ErrorCode CodeOfAbort() const { return Code(Errors::OperationAborted, UsbIo::Status::Cancelled); }
-
     Handle OpenEndpoint(std::uint8_t endpoint) {
         if (!IsNative()) {
             return OpenBound(endpoint);
@@ -49,57 +45,58 @@ INSTANTIATE_TEST_SUITE_P(, EitherDriver, testing::Values(Kind::Native, Kind::Usb
                          });
 
 TEST_P(EitherDriver, CarriesVendorRequests) {
-    device_->Expect({
-        VendorOut(0xC0, {}),
-        VendorOut(0xC1, Counting(8), 0x1234, 0xABCD),
-        VendorOut(0xA0, Counting(65535), 0x2000),
-        VendorIn(0xC2, 8, Counting(8, 1)),
-        VendorIn(0xD1, 6, {9, 8}),
-    });
     const auto file = OpenMain();
-    Bytes none, few = Counting(8), most = Counting(65535), answer(8), room(6, 0x55);
-    EXPECT_EQ(Vendor(file, 0xC0, false, none), (Outcome{0, 0}));
-    EXPECT_EQ(Vendor(file, 0xC1, false, few, 0x1234, 0xABCD), (Outcome{0, 8}));
-    EXPECT_EQ(Vendor(file, 0xA0, false, most, 0x2000), (Outcome{0, 65535}));
-    EXPECT_EQ(Vendor(file, 0xC2, true, answer), (Outcome{0, 8}));
-    EXPECT_EQ(answer, Counting(8, 1));
-    EXPECT_EQ(Vendor(file, 0xD1, true, room), (Outcome{0, 2}));
-    EXPECT_EQ(room, (Bytes{9, 8, 0x55, 0x55, 0x55, 0x55}));
+    struct Case {
+        std::uint8_t request;
+        bool in;
+        std::uint16_t value, index;
+        std::uint32_t length, moved;
+    };
+    for (const Case& row : {
+             Case{0xC0, false, 0, 0, 0, 0},
+             Case{0xC1, false, 0x1234, 0xABCD, 8, 8},
+             Case{0xA0, false, 0x2000, 0, 65535, 65535},
+             Case{0xC2, true, 0, 0, 8, 8},
+             Case{0xD1, true, 0, 0x0102, 6, 2},
+         }) {
+        SCOPED_TRACE(int{row.request});
+        device_->AnswerAtOnce(TransferStatus::Completed, row.moved);
+        const Bytes before = Counting(row.length, 7);
+        Bytes data = before, after = before;
+        EXPECT_EQ(Vendor(file, row.request, row.in, data, row.value, row.index), (Outcome{0, row.moved}));
+        const std::uint8_t type = row.in ? 0xC0 : 0x40;
+        EXPECT_EQ(device_->last.setup, (Platform::Usb::SetupPacket{type, row.request, row.value, row.index,
+                                                                   static_cast<std::uint16_t>(row.length)}));
+        EXPECT_EQ(device_->last.endpoint, 0);
+        EXPECT_EQ(device_->sent, row.in ? Bytes() : before);
+        std::iota(after.begin(), after.begin() + (row.in ? row.moved : 0), std::uint8_t{0});
+        EXPECT_EQ(data, row.in ? after : before);
+    }
 }
 
 TEST_P(EitherDriver, HasAFileForEachEndpoint) {
-    device_->Expect({
-        BulkIn(65536, Counting(65536)),
-        BulkOut(Counting(256, 7)),
-        BulkOut({0}),
-        BulkOut({}),
-        BulkIn(512, Counting(100)),
-        BulkIn(8, {0x42}, InterruptInEndpoint),
-    });
-    const auto in = OpenEndpoint(BulkInEndpoint);
-    const auto out = OpenEndpoint(BulkOutEndpoint);
-    const auto interrupt = OpenEndpoint(InterruptInEndpoint);
-    Bytes buffer(65536), none;
-    EXPECT_EQ(Read(in, buffer), (Outcome{0, 65536}));
-    EXPECT_EQ(buffer, Counting(65536));
-    EXPECT_EQ(Write(out, Counting(256, 7)), (Outcome{0, 256}));
-    EXPECT_EQ(Write(out, {0}), (Outcome{0, 1}));
-    EXPECT_EQ(Write(out, {}), (Outcome{0, 0})) << "an empty packet";
-    EXPECT_EQ(Read(in, none), (Outcome{0, 0})) << "nothing to ask the device for";
-    buffer.assign(512, 0);
-    EXPECT_EQ(Read(in, buffer), (Outcome{0, 100}));
-    buffer.assign(8, 0);
-    EXPECT_EQ(Read(interrupt, buffer), (Outcome{0, 1}));
-    EXPECT_EQ(buffer[0], 0x42);
-    const ErrorCode refused = Code(Errors::InvalidFunction, UsbIo::Status::InvalidDirection);
-    EXPECT_EQ(Write(in, buffer).code, refused);
-    EXPECT_EQ(Write(interrupt, buffer).code, refused);
-    EXPECT_EQ(Read(out, buffer).code, refused);
+    device_->AnswerAtOnce(TransferStatus::Completed, 100);
+    for (const std::uint8_t endpoint : {BulkInEndpoint, BulkOutEndpoint, InterruptInEndpoint}) {
+        SCOPED_TRACE(int{endpoint});
+        const bool in = endpoint != BulkOutEndpoint;
+        const auto file = OpenEndpoint(endpoint);
+        const auto move = [&](Bytes& bytes) { return in ? Read(file, bytes) : Write(file, bytes); };
+        Bytes buffer = Counting(65536, 3), none;
+        EXPECT_EQ(move(buffer), (Outcome{0, 100}));
+        EXPECT_EQ(buffer[99], in ? 99 : 102);
+        EXPECT_EQ(buffer[100], 103);
+        EXPECT_EQ(device_->last.endpoint, endpoint);
+        EXPECT_EQ(device_->last.length, 65536U);
+        EXPECT_EQ(device_->sent, in ? none : buffer);
+        const int before = device_->submissions;
+        EXPECT_EQ(move(none), (Outcome{0, 0}));
+        EXPECT_EQ(device_->submissions - before, in ? 0 : 1) << "an empty packet can be sent, not asked for";
+        EXPECT_EQ((in ? Write(file, buffer) : Read(file, buffer)).code,
+                  Code(Errors::InvalidFunction, UsbIo::Status::InvalidDirection));
+    }
 }
 
 TEST_P(EitherDriver, AbortEndsTheTransfersOfTheEndpoint) {
-    device_->LeaveToTest(BulkInEndpoint);
-    device_->LeaveToTest(InterruptInEndpoint);
     const auto main = OpenMain();
     const auto in = OpenEndpoint(BulkInEndpoint);
     const auto interrupt = OpenEndpoint(InterruptInEndpoint);
@@ -112,45 +109,13 @@ TEST_P(EitherDriver, AbortEndsTheTransfersOfTheEndpoint) {
                                    undefined)
                          : Control(in, UsbIo::Control::AbortPipe),
               (Outcome{0, 0}));
-    EXPECT_EQ(Result(in, aborted[0], true), (Outcome{CodeOfAbort(), 0}));
-    EXPECT_EQ(Result(in, aborted[1], true), (Outcome{CodeOfAbort(), 0}));
+    for (Request& each : aborted) {
+        EXPECT_EQ(Result(in, each, true),
+                  (Outcome{Code(Errors::OperationAborted, UsbIo::Status::Cancelled), 0}));
+    }
     EXPECT_EQ(Result(interrupt, other), (Outcome{Errors::IoIncomplete, 0}));
     device_->Send(InterruptInEndpoint, {1});
     EXPECT_EQ(Result(interrupt, other, true), (Outcome{0, 1}));
-}
-
-TEST_P(EitherDriver, AnInterruptionEndsAllTransfersAndLetsNoneStart) {
-    device_->LeaveToTest(BulkInEndpoint);
-    device_->LeaveToTest(InterruptInEndpoint);
-    const auto drivers = std::move(files_);
-    auto interruptible = std::make_unique<Service::InterruptibleDeviceFiles>(*drivers);
-    auto& inFront = *interruptible;
-    files_ = std::move(interruptible);
-    const Handle opened[] = {OpenMain(), OpenEndpoint(BulkInEndpoint), OpenEndpoint(InterruptInEndpoint)};
-    Bytes buffers[3] = {Bytes(8), Bytes(8), Bytes(8)};
-    Request requests[3];
-    StartPending(opened[1], buffers[0], requests[0]);
-    StartPending(opened[1], buffers[1], requests[1]);
-    StartPending(opened[2], buffers[2], requests[2]);
-    inFront.Interrupt();
-    EXPECT_EQ(Result(opened[1], requests[0]), (Outcome{CodeOfAbort(), 0}));
-    EXPECT_EQ(Result(opened[1], requests[1]), (Outcome{CodeOfAbort(), 0}));
-    EXPECT_EQ(Result(opened[2], requests[2]), (Outcome{CodeOfAbort(), 0}));
-
-    Request refused;
-    EXPECT_FALSE(StartRead(opened[1], buffers[0], refused));
-    EXPECT_EQ(Platform::LastError(), Errors::OperationAborted);
-    EXPECT_TRUE(refused.TakeSignal()) << "nobody must wait for what is refused";
-    EXPECT_FALSE(files_->StartControl(opened[0], 0, nullptr, 0, nullptr, 0, refused.record));
-    EXPECT_EQ(Platform::LastError(), Errors::OperationAborted);
-    inFront.Resume();
-    StartPending(opened[1], buffers[0], requests[0]);
-    device_->Send(BulkInEndpoint, {1, 2});
-    EXPECT_EQ(Result(opened[1], requests[0]), (Outcome{0, 2}));
-    for (const Handle file : opened) {
-        EXPECT_TRUE(files_->CloseFile(file));
-    }
-    files_.reset();
 }
 
 TEST_P(EitherDriver, HasACodeForEveryOutcome) {
@@ -158,32 +123,26 @@ TEST_P(EitherDriver, HasACodeForEveryOutcome) {
         TransferStatus status;
         ErrorCode native, usbIo;
     } cases[] = {
-        {TransferStatus::Completed, Errors::Success, UsbIo::Status::Success},
-        {TransferStatus::Stalled, Errors::GeneralFailure, UsbIo::Status::EndpointHalted},
-        {TransferStatus::IoError, Errors::GeneralFailure, 0xE0000011},
-        {TransferStatus::Overflow, Errors::GeneralFailure, UsbIo::Status::BabbleDetected},
-        {TransferStatus::Cancelled, Errors::OperationAborted, UsbIo::Status::Cancelled},
-        {TransferStatus::DeviceGone, Errors::DeviceNotConnected, UsbIo::Status::DeviceRemoved},
+        {TransferStatus::Completed, 0, 0},
+        {TransferStatus::Stalled, 31, 0xE0000030},
+        {TransferStatus::IoError, 31, 0xE0000011},
+        {TransferStatus::Overflow, 31, 0xE0000012},
+        {TransferStatus::Cancelled, 995, 0xE0010000},
+        {TransferStatus::DeviceGone, 1167, 0xE000100A},
     };
     const auto main = OpenMain();
     const auto in = OpenEndpoint(BulkInEndpoint);
     for (const auto& row : cases) {
         SCOPED_TRACE(static_cast<int>(row.status));
-        const ErrorCode code = Code(row.native, row.usbIo);
-        Bytes buffer(16), data{1, 2};
-        device_->Expect({VendorOut(0xC0, {1, 2}).Ends(row.status, 1)});
-        EXPECT_EQ(Vendor(main, 0xC0, false, data), (Outcome{code, 1}));
-        if (row.status == TransferStatus::DeviceGone) {
-            break;  // nothing is asked of it any more
-        }
-        device_->Expect({BulkIn(16, Counting(16)).Ends(row.status, 5)});
-        EXPECT_EQ(Read(in, buffer), (Outcome{code, 5}));
+        Bytes buffer(16, 0x77), data{1, 2};
+        device_->AnswerAtOnce(row.status, 5);
+        EXPECT_EQ(Read(in, buffer), (Outcome{Code(row.native, row.usbIo), 5}));
         EXPECT_EQ(buffer[4], 4) << "what has moved counts, whatever the end";
-        if (row.status == TransferStatus::Stalled) {
-            device_->Expect({HaltCleared(BulkInEndpoint), BulkIn(16, Counting(16))});
-            EXPECT_EQ(Read(in, buffer), (Outcome{0, 16})) << "the halt is cleared";
-        }
+        device_->AnswerAtOnce(row.status, 1);
+        const bool isGone = row.status == TransferStatus::DeviceGone && !IsNative();
+        EXPECT_EQ(Vendor(main, 0xC0, false, data), (Outcome{Code(row.native, row.usbIo), isGone ? 0U : 1U}));
     }
+    EXPECT_EQ(device_->clearedHalts, Bytes{BulkInEndpoint}) << "no halt outlasts what comes next";
 }
 
 }  // namespace

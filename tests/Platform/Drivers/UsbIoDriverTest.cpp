@@ -1,4 +1,5 @@
 #include "Platform/Drivers/DriverFixture.h"
+#include "Platform/EventScheduler.h"
 #include "Support/TestClock.h"
 
 namespace Varnholt::Tests {
@@ -16,8 +17,8 @@ struct Step {
     std::size_t file;
     std::uint32_t code;
     Bytes input;
-    std::size_t outputSize;
-    Platform::ErrorCode status;
+    Platform::ErrorCode status = Status::Success;
+    std::size_t outputSize = 0;
 };
 
 class UsbIoDriver : public DriverFixture {
@@ -36,173 +37,139 @@ class UsbIoDriver : public DriverFixture {
         for (const auto handle : opened) {
             EXPECT_TRUE(files_->CloseFile(handle));
         }
-        EXPECT_FALSE(device_->IsOpen()) << name;
+        EXPECT_EQ(std::pair(device_->handles, device_->isClaimed), std::pair(0, false)) << name;
     }
 };
 
 TEST_F(UsbIoDriver, ChecksStatesAsARealDriverDoes) {
-    const Step configure{0, Code::SetConfiguration, ConfigurationBlock(), 0, 0};
-    Play("unconfiguring what is not configured",
-         {{0, Code::UnconfigureDevice, {}, 0, 0}, {0, Code::UnconfigureDevice, {}, 0, 0}});
-    Play("configuring twice",
-         {configure,
-          {0, Code::SetConfiguration, ConfigurationBlock(), 0, Status::AlreadyConfigured},
-          {1, Code::SetConfiguration, ConfigurationBlock(), 0, Status::AlreadyConfigured},
-          {1, Code::UnconfigureDevice, {}, 0, 0},
-          {1, Code::SetConfiguration, ConfigurationBlock(), 0, 0}});
-    Play("binding", {{0, Code::BindPipe, {In}, 0, Status::NotConfigured},
+    const Step configure{0, Code::SetConfiguration, ConfigurationBlock()};
+    const Step unconfigure{0, Code::UnconfigureDevice, {}};
+    Play("unconfiguring what is not configured", {unconfigure, unconfigure});
+    Play("configuring twice", {configure,
+                               {0, Code::SetConfiguration, ConfigurationBlock(), Status::AlreadyConfigured},
+                               {1, Code::SetConfiguration, ConfigurationBlock(), Status::AlreadyConfigured},
+                               {1, Code::UnconfigureDevice, {}},
+                               {1, Code::SetConfiguration, ConfigurationBlock()}});
+    Play("binding", {{0, Code::BindPipe, {In}, Status::NotConfigured},
                      configure,
-                     {0, Code::BindPipe, {0x81}, 0, Status::PipeNotFound},
-                     {0, Code::BindPipe, {0}, 0, Status::PipeNotFound},
-                     {1, Code::BindPipe, {In}, 0, 0},
-                     {1, Code::BindPipe, {In}, 0, Status::AlreadyBound},
-                     {1, Code::BindPipe, {Out}, 0, Status::AlreadyBound},
-                     {2, Code::BindPipe, {In}, 0, Status::AlreadyBound},
-                     {2, Code::BindPipe, {Out}, 0, 0},
-                     {3, Code::BindPipe, {Protocol::InterruptInEndpoint}, 0, 0}});
+                     {0, Code::BindPipe, {0x81}, Status::PipeNotFound},
+                     {0, Code::BindPipe, {0}, Status::PipeNotFound},
+                     {1, Code::BindPipe, {In}},
+                     {1, Code::BindPipe, {In}, Status::AlreadyBound},
+                     {1, Code::BindPipe, {Out}, Status::AlreadyBound},
+                     {2, Code::BindPipe, {In}, Status::AlreadyBound},
+                     {2, Code::BindPipe, {Out}},
+                     {3, Code::BindPipe, {Protocol::InterruptInEndpoint}}});
     Play("open pipes keep the configuration", {configure,
-                                               {1, Code::BindPipe, {In}, 0, 0},
-                                               {0, Code::UnconfigureDevice, {}, 0, Status::OpenPipes},
-                                               {1, Code::UnconfigureDevice, {}, 0, Status::OpenPipes}});
-    Play("aborting", {{0, Code::AbortPipe, {}, 0, Status::NotBound},
+                                               {1, Code::BindPipe, {In}},
+                                               {0, Code::UnconfigureDevice, {}, Status::OpenPipes},
+                                               {1, Code::UnconfigureDevice, {}, Status::OpenPipes}});
+    Play("aborting", {{0, Code::AbortPipe, {}, Status::NotBound},
                       configure,
-                      {0, Code::AbortPipe, {}, 0, Status::NotBound},
-                      {0, Code::BindPipe, {In}, 0, 0},
-                      {0, Code::AbortPipe, {}, 0, 0}});
+                      {0, Code::AbortPipe, {}, Status::NotBound},
+                      {0, Code::BindPipe, {In}},
+                      {0, Code::AbortPipe, {}}});
     Play("a vendor request before the configuration",
-         {{0, Code::ClassOrVendorOutRequest, RequestBlock(0xC0), 0, Status::NotConfigured},
-          {0, Code::ClassOrVendorInRequest, RequestBlock(0xC0), 0, Status::NotConfigured}});
+         {{0, Code::ClassOrVendorOutRequest, RequestBlock(0xC0), Status::NotConfigured},
+          {0, Code::ClassOrVendorInRequest, RequestBlock(0xC0), Status::NotConfigured}});
 }
 
 TEST_F(UsbIoDriver, ChecksSizesAndContents) {
-    Bytes tooShort = ConfigurationBlock();
-    tooShort.pop_back();
-    Play("configuration blocks",
-         {{0, Code::SetConfiguration, {}, 0, Status::InputBufferTooSmall},
-          {0, Code::SetConfiguration, tooShort, 0, Status::InputBufferTooSmall},
-          {0, Code::SetConfiguration, ConfigurationBlock(1), 0, Status::InvalidParameter},
-          {0, Code::SetConfiguration, ConfigurationBlock(0, 0), 0, Status::InvalidParameter},
-          {0, Code::SetConfiguration, ConfigurationBlock(0, 2), 0, Status::InvalidParameter},
-          {0, Code::SetConfiguration, ConfigurationBlock(0, 33), 0, Status::InvalidParameter},
-          {0, Code::SetConfiguration, ConfigurationBlock(0, 1, 0, 0, 0), 0, Status::InvalidParameter},
-          {0, Code::SetConfiguration, ConfigurationBlock(0, 1, 1), 0, Status::InterfaceNotFound},
-          {0, Code::SetConfiguration, ConfigurationBlock(0, 1, 0, 1), 0, Status::InterfaceNotFound}});
-    EXPECT_EQ(device_->TimesOpened(), 0u) << "a block that is refused does not reach the device";
+    const auto refused = [](const Bytes& block, Platform::ErrorCode status) {
+        return Step{0, Code::SetConfiguration, block, status};
+    };
+    Play("configuration blocks", {refused(Bytes(259), Status::InputBufferTooSmall),
+                                  refused(ConfigurationBlock(1), Status::InvalidParameter),
+                                  refused(ConfigurationBlock(0, 0), Status::InvalidParameter),
+                                  refused(ConfigurationBlock(0, 2), Status::InvalidParameter),
+                                  refused(ConfigurationBlock(0, 1, 0, 0, 0), Status::InvalidParameter),
+                                  refused(ConfigurationBlock(0, 1, 1), Status::InterfaceNotFound),
+                                  refused(ConfigurationBlock(0, 1, 0, 1), Status::InterfaceNotFound)});
+    EXPECT_EQ(device_->opened, 0) << "a block that is refused does not reach the device";
+    const auto vendor = [](const Bytes& block, Platform::ErrorCode status, std::size_t data = 0) {
+        return Step{0, Code::ClassOrVendorOutRequest, block, status, data};
+    };
     Play("the other controls",
-         {{0, Code::SetConfiguration, ConfigurationBlock(), 0, 0},
-          {0, Code::BindPipe, {}, 0, Status::InputBufferTooSmall},
-          {0, Code::GetDriverInfo, {}, 11, Status::OutputBufferTooSmall},
-          {0, Code::GetDriverInfo, {}, 0, Status::OutputBufferTooSmall},
-          {0, Code::GetDeviceParameters, {}, 7, Status::OutputBufferTooSmall},
-          {0, Code::SetDeviceParameters, Bytes(7), 0, Status::InputBufferTooSmall},
-          {0, Code::ClassOrVendorOutRequest, Bytes(17), 0, Status::InputBufferTooSmall},
-          {0, Code::ClassOrVendorInRequest, Bytes(17), 0, Status::InputBufferTooSmall},
-          {0, Code::ClassOrVendorOutRequest, RequestBlock(1, 0, 0, 1), 0, Status::InvalidType},
-          {0, Code::ClassOrVendorOutRequest, RequestBlock(1, 0, 0, 2, 1), 0, Status::InvalidRecipient},
-          {0, Code::ClassOrVendorOutRequest, RequestBlock(1, 0, 0, 2, 0, 0x80), 0, Status::InvalidParameter},
-          {0, Code::ClassOrVendorOutRequest, RequestBlock(1, 0, 0, 2, 0, 0x01), 0, Status::InvalidParameter},
-          {0, Code::ClassOrVendorOutRequest, RequestBlock(1), 65536, Status::InvalidParameter},
-          {0, Protocol::NativeDriver::ControlVendorRequest, Bytes(18), 0, Status::ControlNotSupported},
-          {0, 0, {}, 0, Status::ControlNotSupported}});
-}
-
-TEST_F(UsbIoDriver, ListingLeavesTheDeviceAlone) {
-    device_->AnswerClaim(Errors::Busy);
-    const auto file = Open("usbio/port1");
-    Bytes info(16, 0x55);
-    EXPECT_EQ(Control(file, Code::GetDriverInfo, {}, info), (Outcome{0, 12}));
-    EXPECT_EQ(info, (Bytes{0x30, 0x02, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0x55, 0x55, 0x55, 0x55}));
-    EXPECT_TRUE(files_->CloseFile(file));
-    EXPECT_EQ(device_->TimesOpened(), 0u);
+         {{0, Code::SetConfiguration, ConfigurationBlock()},
+          {0, Code::BindPipe, {}, Status::InputBufferTooSmall},
+          {0, Code::GetDriverInfo, {}, Status::OutputBufferTooSmall, 11},
+          {0, Code::GetDeviceParameters, {}, Status::OutputBufferTooSmall, 7},
+          {0, Code::SetDeviceParameters, Bytes(7), Status::InputBufferTooSmall},
+          {0, Code::ClassOrVendorInRequest, Bytes(17), Status::InputBufferTooSmall},
+          vendor(Bytes(17), Status::InputBufferTooSmall),
+          vendor(RequestBlock(1, 0, 0, 1), Status::InvalidType),
+          vendor(RequestBlock(1, 0, 0, 2, 1), Status::InvalidRecipient),
+          vendor(RequestBlock(1, 0, 0, 2, 0, 0x80), Status::InvalidParameter),
+          vendor(RequestBlock(1, 0, 0, 2, 0, 0x01), Status::InvalidParameter),
+          vendor(RequestBlock(1), Status::InvalidParameter, 65536),
+          {0, Protocol::NativeDriver::ControlVendorRequest, Bytes(18), Status::ControlNotSupported}});
 }
 
 TEST_F(UsbIoDriver, ConfiguringTellsWhyTheDeviceCannotBeHad) {
-    const struct {
-        Platform::ErrorCode code;
-        Platform::ErrorCode status;
-    } cases[] = {
+    const std::pair<Platform::ErrorCode, Platform::ErrorCode> cases[] = {
         {Errors::Busy, Status::OpenedByOtherProcess},        {Errors::AccessDenied, Errors::AccessDenied},
         {Errors::NotEnoughMemory, Status::NoMemory},         {Errors::GeneralFailure, Status::RequestFailed},
         {Errors::DeviceNotConnected, Status::DeviceRemoved}, {Errors::SemaphoreTimeout, Status::TimedOut},
     };
-    for (const auto& row : cases) {
-        const auto file = Open("usbio/port1");
-        bus_.AnswerOpen(row.code);
-        EXPECT_EQ(Control(file, Code::SetConfiguration, ConfigurationBlock()).code, row.status) << row.code;
-        EXPECT_TRUE(files_->CloseFile(file));
-        bus_.AnswerOpen(Errors::Success);
-
-        const auto silent = Open("usbio/port1");
-        EXPECT_EQ(Control(silent, Code::SetConfiguration, ConfigurationBlock()).code, Status::Success);
-        device_->AnswerEndpoints(row.code);
-        EXPECT_EQ(Control(silent, Code::BindPipe, {In}).code, row.status) << row.code;
-        device_->AnswerEndpoints(Errors::Success);
-        EXPECT_TRUE(files_->CloseFile(silent));
-
-        const auto second = Open("usbio/port1");
-        device_->AnswerClaim(row.code);
-        EXPECT_EQ(Control(second, Code::SetConfiguration, ConfigurationBlock()).code, row.status) << row.code;
-        device_->AnswerClaim(Errors::Success);
-        EXPECT_EQ(Control(second, Code::UnconfigureDevice).code,
-                  row.status == Status::DeviceRemoved ? Status::DeviceRemoved : Status::Success);
-        EXPECT_TRUE(files_->CloseFile(second));
+    for (const auto& [code, status] : cases) {
+        for (Platform::ErrorCode* const answer :
+             {&bus_.openAnswer, &device_->claimAnswer, &device_->endpointsAnswer}) {
+            const bool isClaimed = answer == &device_->endpointsAnswer;
+            const auto file = Open("usbio/port1");
+            *answer = code;
+            EXPECT_EQ(Control(file, Code::SetConfiguration, ConfigurationBlock()).code,
+                      isClaimed ? Status::Success : status)
+                << code;
+            EXPECT_EQ(Control(file, Code::BindPipe, {In}).code,
+                      isClaimed || code == Errors::DeviceNotConnected ? status : Status::NotConfigured)
+                << code;
+            *answer = Errors::Success;
+            EXPECT_TRUE(files_->CloseFile(file));
+        }
     }
 }
 
 TEST_F(UsbIoDriver, TheConfigurationLastsAsLongAsAFileIsOpen) {
-    const auto first = Open("usbio/port1");
-    const auto second = Open("usbio/port1");
-    EXPECT_EQ(Control(first, Code::SetConfiguration, ConfigurationBlock()).code, 0u);
-    EXPECT_EQ(Control(first, Code::BindPipe, {In}).code, 0u);
-    EXPECT_TRUE(files_->CloseFile(first));
-    EXPECT_TRUE(device_->IsClaimed());
-    EXPECT_EQ(Control(second, Code::BindPipe, {In}).code, 0u) << "closing unbinds";
-    EXPECT_TRUE(files_->CloseFile(second));
-    EXPECT_FALSE(device_->IsClaimed());
-
-    const auto third = Open("usbio/port1");
-    EXPECT_EQ(Control(third, Code::BindPipe, {In}).code, Status::NotConfigured);
-    EXPECT_EQ(Control(third, Code::SetConfiguration, ConfigurationBlock()).code, 0u);
-    EXPECT_EQ(Control(third, Code::UnconfigureDevice).code, 0u);
-    EXPECT_FALSE(device_->IsClaimed());
-}
-
-TEST_F(UsbIoDriver, ParametersBelongToTheDevice) {
-    const auto first = Open("usbio/port1");
+    const auto first = OpenBound(In);
     const auto second = Open("usbio/port1");
     Bytes parameters(8, 0x55);
     EXPECT_EQ(Control(first, Code::GetDeviceParameters, {}, parameters), (Outcome{0, 8}));
     EXPECT_EQ(parameters, Bytes(8));
     EXPECT_EQ(Control(first, Code::SetDeviceParameters, Counting(8, 1)).code, 0u);
+    EXPECT_TRUE(files_->CloseFile(first));
+    EXPECT_TRUE(device_->isClaimed);
+    EXPECT_EQ(Control(second, Code::BindPipe, {In}).code, 0u) << "closing unbinds";
     EXPECT_EQ(Control(second, Code::GetDeviceParameters, {}, parameters), (Outcome{0, 8}));
-    EXPECT_EQ(parameters, Counting(8, 1));
+    EXPECT_EQ(parameters, Counting(8, 1)) << "they are the device's";
+    EXPECT_TRUE(files_->CloseFile(second));
+    EXPECT_FALSE(device_->isClaimed);
+
+    // Listing leaves the device alone.
+    const auto third = Open("usbio/port1");
+    Bytes info(16, 0x55);
+    EXPECT_EQ(Control(third, Code::GetDriverInfo, {}, info), (Outcome{0, 12}));
+    EXPECT_EQ(info, (Bytes{0x30, 0x02, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0x55, 0x55, 0x55, 0x55}));
+    EXPECT_EQ(Control(third, Code::BindPipe, {In}).code, Status::NotConfigured);
+    EXPECT_EQ(device_->opened, 1);
+    EXPECT_EQ(Control(third, Code::SetConfiguration, ConfigurationBlock()).code, 0u);
+    EXPECT_EQ(Control(third, Code::UnconfigureDevice).code, 0u);
+    EXPECT_FALSE(device_->isClaimed);
 }
 
-TEST_F(UsbIoDriver, TransfersNeedABoundPipe) {
-    Bytes buffer(1);
+TEST_F(UsbIoDriver, TransfersNeedABoundPipeAndTheConfigurationLimitsThem) {
+    device_->AnswerAtOnce();
+    Bytes fits(512), tooLong(513), data{5};
     const auto unbound = Open("usbio/port1");
-    EXPECT_EQ(Read(unbound, buffer).code, Status::NotBound);
-    EXPECT_EQ(Write(unbound, buffer).code, Status::NotBound);
-    OpenBound(In);
-    EXPECT_EQ(Read(unbound, buffer).code, Status::NotBound);
-}
-
-TEST_F(UsbIoDriver, PassesOnReservedBitsOfTheRequestType) {
-    device_->Expect({ControlOut({Protocol::VendorOut | 0x1C, 0xC7, 0, 0, 1}, {5})});
-    Bytes data{5};
-    EXPECT_EQ(
-        Control(OpenBound(In), Code::ClassOrVendorOutRequest, RequestBlock(0xC7, 0, 0, 2, 0, 0x1C), data),
-        (Outcome{0, 1}));
-}
-
-TEST_F(UsbIoDriver, TheConfigurationLimitsTransfers) {
-    device_->Expect({BulkIn(512, {})});
-    const auto file = Open("usbio/port1");
-    EXPECT_EQ(Control(file, Code::SetConfiguration, ConfigurationBlock(0, 1, 0, 0, 512)).code, 0u);
-    EXPECT_EQ(Control(file, Code::BindPipe, {In}).code, 0u);
-    Bytes fits(512), tooLong(513);
-    EXPECT_EQ(Read(file, fits).code, 0u);
-    EXPECT_EQ(Read(file, tooLong).code, Status::InvalidParameter);
+    const auto bound = Open("usbio/port1");
+    EXPECT_EQ(Control(bound, Code::SetConfiguration, ConfigurationBlock(0, 1, 0, 0, 512)).code, 0u);
+    EXPECT_EQ(Control(bound, Code::BindPipe, {In}).code, 0u);
+    EXPECT_EQ(Read(unbound, fits).code, Status::NotBound);
+    EXPECT_EQ(Write(unbound, fits).code, Status::NotBound);
+    EXPECT_EQ(Read(bound, fits).code, 0u);
+    EXPECT_EQ(Read(bound, tooLong).code, Status::InvalidParameter);
+    EXPECT_EQ(Control(bound, Code::ClassOrVendorOutRequest, RequestBlock(0xC7, 0, 0, 2, 0, 0x1C), data).code,
+              0u);
+    EXPECT_EQ(device_->last.setup.requestType, 0x40 | 0x1C) << "reserved bits are passed on";
 }
 
 TEST_F(UsbIoDriver, GivesUpWhatNobodyElseLimits) {
@@ -210,49 +177,60 @@ TEST_F(UsbIoDriver, GivesUpWhatNobodyElseLimits) {
     if (!clock.IsVirtual()) {
         GTEST_SKIP() << "takes eleven seconds of real time";
     }
-    device_->Expect({VendorOut(0xC0, {}).OnDemand(), VendorIn(0xC2, 8, Counting(8)).After(4'999'000),
-                     BulkOut(Counting(100)).OnDemand().MovesWhenCancelled(64), BulkOut({1}).After(5'000'000),
-                     BulkIn(8, {}).OnDemand()});
     const auto out = OpenBound(Out);
     const auto in = OpenBound(In);
-    Bytes buffer(8);
+    device_->onCancel = [](Transfer& transfer) {
+        HookedDevice::Complete(transfer, TransferStatus::Cancelled, transfer.length / 2);
+    };
+    const auto vendor = [&] { return Control(out, Code::ClassOrVendorOutRequest, RequestBlock(0xC0)); };
     const Stopwatch control(clock);
-    EXPECT_EQ(Control(out, Code::ClassOrVendorOutRequest, RequestBlock(0xC0)),
-              (Outcome{Status::TimedOut, 0}));
+    EXPECT_EQ(vendor(), (Outcome{Status::TimedOut, 0}));
     control.Expect(5000);
-    EXPECT_EQ(Control(out, Code::ClassOrVendorInRequest, RequestBlock(0xC2), buffer), (Outcome{0, 8}));
     const Stopwatch write(clock);
-    EXPECT_EQ(Write(out, Counting(100)), (Outcome{Status::TimedOut, 64}));
+    EXPECT_EQ(Write(out, Counting(100)), (Outcome{Status::TimedOut, 50}));
     write.Expect(6000);
-    EXPECT_EQ(Write(out, {1}), (Outcome{0, 1}));
-
+    Bytes buffer(8);
     Request reading;
     StartPending(in, buffer, reading);
     EXPECT_EQ(Platform::Wait(reading.event.Get(), 100'000), Platform::WaitResult::TimedOut)
         << "who reads has a limit of his own";
     EXPECT_TRUE(files_->CloseFile(in));
+
+    device_->onSubmit = [](Transfer& transfer) {
+        auto& scheduler = Platform::ClockScheduler();
+        scheduler.CallAt(scheduler.Now() + 4'999'000, [&transfer] {
+            HookedDevice::Complete(transfer, TransferStatus::Completed, transfer.length);
+        });
+        return Errors::Success;
+    };
+    EXPECT_EQ(vendor(), (Outcome{0, 0}));
+    EXPECT_EQ(Write(out, {1}), (Outcome{0, 1}));
 }
 
 TEST_F(UsbIoDriver, ADeviceThatIsGoneHasOneCode) {
-    device_->LeaveToTest(In);
     const auto main = Open("usbio/port1");
     const auto in = OpenBound(In);
-    Bytes buffer(8), info(12), parameters(8);
+    Bytes buffer(8);
     Request reading;
     StartPending(in, buffer, reading);
-    bus_.Unplug("port1");
+    bus_.devices.clear();
+    device_->Unplug();
     EXPECT_EQ(Result(in, reading, true), (Outcome{Status::DeviceRemoved, 0}));
     EXPECT_EQ(Read(in, buffer).code, Status::DeviceRemoved);
-    EXPECT_EQ(Control(main, Code::ClassOrVendorOutRequest, RequestBlock(0xC0)).code, Status::DeviceRemoved);
-    EXPECT_EQ(Control(main, Code::UnconfigureDevice).code, Status::DeviceRemoved);
-    EXPECT_EQ(Control(main, Code::SetConfiguration, ConfigurationBlock()).code, Status::DeviceRemoved);
-    EXPECT_EQ(Control(main, Code::BindPipe, {Out}).code, Status::DeviceRemoved);
-    EXPECT_EQ(Control(in, Code::AbortPipe).code, Status::DeviceRemoved);
-    EXPECT_EQ(Control(main, Code::GetDeviceParameters, {}, parameters).code, Status::DeviceRemoved);
-    EXPECT_EQ(Control(main, Code::GetDriverInfo, {}, info).code, 0u);
     EXPECT_EQ(OpenError("usbio/port1"), Errors::FileNotFound);
-    EXPECT_TRUE(files_->CloseFile(in));
-    EXPECT_TRUE(files_->CloseFile(main));
+    for (const auto& [code, input] : {std::pair{Code::ClassOrVendorOutRequest, RequestBlock(0xC0)},
+                                      {Code::UnconfigureDevice, {}},
+                                      {Code::SetConfiguration, ConfigurationBlock()},
+                                      {Code::BindPipe, {Out}},
+                                      {Code::AbortPipe, {}},
+                                      {Code::GetDeviceParameters, {}},
+                                      {Code::SetDeviceParameters, Bytes(8)},
+                                      {Code::GetDriverInfo, {}}}) {
+        Bytes output(12);
+        EXPECT_EQ(Control(main, code, input, output).code,
+                  code == Code::GetDriverInfo ? Status::Success : Status::DeviceRemoved)
+            << std::hex << code;
+    }
 }
 
 }  // namespace
