@@ -77,18 +77,15 @@ TEST_F(EepromFileTest, MemoryIsThereAgainAfterARestart) {
 }
 
 TEST_F(EepromFileTest, UnusableFilesAreExplained) {
-    struct Case {
-        std::size_t size;
-        const char* explanation;
-    };
-    for (const Case& test : {Case{0, "has 0 bytes, but an EEPROM has 8192"}, Case{8191, "has 8191 bytes"},
-                             Case{8193, "remove this one to begin with a fresh EEPROM"}}) {
-        Tests::WriteFile(fileName_, Bytes(test.size));
+    for (const auto& [size, explanation] : {std::pair{0U, "has 0 bytes, but an EEPROM has 8192"},
+                                            {8191U, "has 8191 bytes"},
+                                            {8193U, "remove this one to begin with a fresh EEPROM"}}) {
+        Tests::WriteFile(fileName_, Bytes(size));
         try {
             ReadEepromFile(fileName_);
-            ADD_FAILURE() << test.size;
+            ADD_FAILURE() << size;
         } catch (const std::runtime_error& error) {
-            EXPECT_THAT(error.what(), HasSubstr(test.explanation));
+            EXPECT_THAT(error.what(), HasSubstr(explanation));
         }
     }
     EXPECT_THROW(ReadEepromFile(folder_.Path("none")), std::runtime_error);

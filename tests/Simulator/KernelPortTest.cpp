@@ -32,18 +32,19 @@ TEST_F(KernelPortTest, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
         std::vector<std::string> controllers;
         std::string order;  ///< empty: none is free
     };
-    const std::string port0 = "hs  0000";
-    const std::string port1 = "hs  0001";
-    const std::string port30 = "hs  0030";
+    const auto port = [](const char* number, const char* state) {
+        return "hs  00" + std::string(number) + state;
+    };
     for (const Case& test : {
-             Case{
-                 "all free", {port0 + Free + port1 + Free + "ss  0015" + Free, port30 + Free}, "0 7 65538 3"},
-             Case{"one used", {port0 + Attached + port1 + Free, port30 + Free}, "30 7 65538 3"},
-             Case{"only beside a used one",
-                  {port0 + Attached + port1 + Free, port30 + Attached},
+             Case{"all free",
+                  {port("00", Free) + port("01", Free) + "ss  0015" + Free, port("30", Free)},
+                  "0 7 65538 3"},
+             Case{"one used", {port("00", Attached) + port("01", Free), port("30", Free)}, "30 7 65538 3"},
+             Case{"beside used ones",
+                  {port("00", Attached) + port("01", Free), port("30", Attached)},
                   "1 7 65538 3"},
              Case{"super speed only", {"ss  0015" + std::string(Free)}, ""},
-             Case{"all used", {port0 + Attached, port30 + Attached}, ""},
+             Case{"all used", {port("00", Attached), port("30", Attached)}, ""},
          }) {
         std::filesystem::remove_all(folder_);
         std::filesystem::create_directory(folder_);

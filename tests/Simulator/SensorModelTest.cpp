@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <numeric>
 #include <vector>
 
 #include "Protocol/ByteOrder.h"
@@ -22,11 +23,7 @@ std::vector<std::uint16_t> Readings(const SensorModel& sensor, Exposure exposure
 
 /// Of the pixels that see light.
 double Mean(const std::vector<std::uint16_t>& values) {
-    double sum = 0;
-    for (std::size_t i = 1; i < 127; ++i) {
-        sum += values[i];
-    }
-    return sum / 126;
+    return std::accumulate(values.begin() + 1, values.begin() + 127, 0.0) / 126;
 }
 
 TEST(SensorModelTest, MoreLightOrTimeGivesMoreUntilItSaturates) {
@@ -42,28 +39,11 @@ TEST(SensorModelTest, MoreLightOrTimeGivesMoreUntilItSaturates) {
     EXPECT_LT(normal[0], 200) << "a covered pixel";
 }
 
-TEST(SensorModelTest, NoiseIsSeededAndAveragesOut) {
+TEST(SensorModelTest, NoiseIsSeeded) {
     const SensorModel dark(1, 0.0, 1.0);
     EXPECT_EQ(Readings(dark, {20000}, 3, 4), Readings(dark, {20000}, 3, 4));
     EXPECT_NE(Readings(dark, {20000}, 3, 4), Readings(dark, {20000}, 4, 4));
     EXPECT_NE(Readings(dark, {20000}, 3, 4), Readings(SensorModel(2, 0.0, 1.0), {20000}, 3, 4));
-
-    const auto spread = [&](std::uint32_t averages) {
-        double squares = 0;
-        int negative = 0;
-        for (std::uint32_t record = 0; record < 20; ++record) {
-            const auto values = Readings(dark, {20000, averages}, 0, record);
-            for (std::size_t i = 1; i < 127; ++i) {
-                const int value = static_cast<std::int16_t>(values[i]);
-                squares += (value - 11) * (value - 11);
-                negative += value < 0 ? 1 : 0;
-            }
-        }
-        EXPECT_EQ(averages == 1, negative > 0);
-        return squares / (20 * 126);
-    };
-    EXPECT_NEAR(36.0, spread(1), 8);
-    EXPECT_LT(spread(256), 3);
 }
 
 }  // namespace

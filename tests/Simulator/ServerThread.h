@@ -1,17 +1,17 @@
 #pragma once
 
+#include <fcntl.h>
 #include <poll.h>
-#include <sys/eventfd.h>
 #include <unistd.h>
 
+#include <array>
+#include <cstdlib>
 #include <functional>
 #include <future>
 #include <memory>
-#include <mutex>
 #include <string>
 #include <thread>
 #include <utility>
-#include <vector>
 
 #include "PollLoop.h"
 #include "UsbIpServer.h"
@@ -21,8 +21,17 @@ namespace Varnholt::Simulator {
 /// A server with its loop on a thread of its own, as if it were another program.
 class ServerThread final {
   public:
-    ServerThread() : wake_(eventfd(0, EFD_CLOEXEC)), server_(std::make_unique<UsbIpServer>(loop_, Log())) {
-        loop_.Watch(wake_, POLLIN, [this] { DoTasks(); });
+    ServerThread() : server_(std::make_unique<UsbIpServer>(loop_, Log())) {
+        if (pipe2(tasks_.data(), O_CLOEXEC) != 0) {
+            std::abort();
+        }
+        loop_.Watch(tasks_[0], POLLIN, [this] {
+            Task* task = nullptr;
+            if (read(tasks_[0], &task, sizeof task) == sizeof task) {
+                Task own = std::move(*task);  // whoever waits for its end destroys the other
+                own();
+            }
+        });
         thread_ = std::thread([this] { loop_.Run(); });
     }
     ~ServerThread() {
@@ -31,7 +40,8 @@ class ServerThread final {
             loop_.Stop();
         });
         thread_.join();
-        close(wake_);
+        close(tasks_[0]);
+        close(tasks_[1]);
     }
     ServerThread(const ServerThread&) = delete;
     ServerThread& operator=(const ServerThread&) = delete;
@@ -49,48 +59,31 @@ class ServerThread final {
         return instrument;
     }
 
-    /// Calls `task` on the server's thread and waits for its end; passes on what it throws.
-    void Do(std::function<void()> task) {
-        std::packaged_task<void()> packaged(std::move(task));
-        auto done = packaged.get_future();
-        {
-            const std::lock_guard lock(mutex_);
-            tasks_.push_back(std::move(packaged));
+    /// Calls `function` on the server's thread and waits for its end; passes on what it throws.
+    void Do(std::function<void()> function) {
+        Task task(std::move(function));
+        Task* const pointer = &task;
+        auto done = task.get_future();
+        if (write(tasks_[1], &pointer, sizeof pointer) == sizeof pointer) {
+            done.get();
         }
-        eventfd_write(wake_, 1);
-        done.get();
     }
     /// Lets the server's time jump.
     void Advance(std::uint64_t microseconds) {
         Do([&] { loop_.ahead += microseconds; });
     }
     UsbIpServer& Server() { return *server_; }
-    PollLoop& Loop() { return loop_; }
 
   private:
+    using Task = std::packaged_task<void()>;
     struct AdvancedLoop final : PollLoop {
         std::uint64_t Now() override { return PollLoop::Now() + ahead; }
         std::uint64_t ahead = 0;
     };
 
-    void DoTasks() {
-        eventfd_t count = 0;
-        eventfd_read(wake_, &count);
-        std::vector<std::packaged_task<void()>> now;
-        {
-            const std::lock_guard lock(mutex_);
-            now.swap(tasks_);
-        }
-        for (auto& task : now) {
-            task();
-        }
-    }
-
-    const int wake_;
+    std::array<int, 2> tasks_{-1, -1};  ///< a pipe with pointers to tasks
     AdvancedLoop loop_;
     std::unique_ptr<UsbIpServer> server_;
-    std::mutex mutex_;  // guards `tasks`
-    std::vector<std::packaged_task<void()>> tasks_;
     std::thread thread_;
 };
 

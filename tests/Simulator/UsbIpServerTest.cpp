@@ -1,7 +1,5 @@
 // Server and client together, over the sockets that programs use.
-#include <arpa/inet.h>
 #include <gtest/gtest.h>
-#include <netinet/in.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -16,15 +14,15 @@
 #include "Platform/Usb/SimulatorBus.h"
 #include "Platform/Usb/SystemUsbBus.h"
 #include "Platform/Usb/UsbIpDevice.h"
-#include "Protocol/ByteOrder.h"
 #include "Simulator/ServerThread.h"
+#include "Support/Bytes.h"
+#include "Support/ResourceCount.h"
 #include "Support/TestTransfer.h"
 #include "UsbIpServer.h"
 
 namespace Varnholt::Simulator {
 namespace {
 
-using Bytes = std::vector<std::uint8_t>;
 using Platform::Usb::ListSimulators;
 using Platform::Usb::SimulatorBus;
 using Platform::Usb::SimulatorInfo;
@@ -32,26 +30,28 @@ using Platform::Usb::TransferStatus;
 using Platform::Usb::UsbDevice;
 using Protocol::BulkInEndpoint;
 using Protocol::BulkOutEndpoint;
-using Protocol::InterruptInEndpoint;
 using Protocol::Request;
+using Tests::Bytes;
 using Tests::TestTransfer;
 namespace Errors = Platform::Errors;
 namespace UsbIp = Platform::Usb::UsbIp;
 
 /// Does a transfer and answers the bytes that came.
-Bytes Do(UsbDevice& device, TestTransfer&& transfer) {
+Bytes Do(UsbDevice& device, TestTransfer&& transfer, TransferStatus status = TransferStatus::Completed) {
     EXPECT_EQ(Errors::Success, device.Submit(transfer));
     EXPECT_TRUE(transfer.Wait());
-    EXPECT_EQ(TransferStatus::Completed, transfer.status);
+    EXPECT_EQ(status, transfer.status);
     return transfer.Data();
 }
 
 class UsbIpServerTest : public testing::Test {
   protected:
-    static std::shared_ptr<UsbDevice> Open(const std::string& name) {
+    static std::shared_ptr<UsbDevice> Open(const std::string& name,
+                                           Platform::ErrorCode expected = Errors::Success) {
         Platform::ErrorCode error = Errors::Success;
         auto device = SimulatorBus().Open("simulated-" + name, error);
-        EXPECT_EQ(Errors::Success, error);
+        EXPECT_EQ(expected, error) << name;
+        EXPECT_EQ(expected == Errors::Success, device != nullptr) << name;
         return device;
     }
     static std::shared_ptr<UsbDevice> OpenAndClaim(const std::string& name) {
@@ -59,9 +59,12 @@ class UsbIpServerTest : public testing::Test {
         EXPECT_EQ(Errors::Success, device->Claim());
         return device;
     }
+    /// Two ways to ask.
     static bool Listed(const std::string& name) {
         const auto names = SimulatorBus().List();
-        return std::ranges::find(names, "simulated-" + name) != names.end();
+        const bool isListed = std::ranges::count(names, "simulated-" + name) == 1;
+        EXPECT_EQ(isListed, SimulatorBus().Has("simulated-" + name));
+        return isListed;
     }
     static SimulatorInfo Describe(const std::string& name) {
         for (const SimulatorInfo& info : ListSimulators()) {
@@ -87,22 +90,33 @@ TEST_F(UsbIpServerTest, InstrumentsAreListedByNameForAsLongAsTheyAreThere) {
         return each != "simulated-" + name_ && each != "simulated-" + other;
     });
     EXPECT_EQ((std::vector<std::string>{"simulated-" + name_, "simulated-" + other}), names);
-    EXPECT_THROW(server_.Add(name_), std::runtime_error);
-    EXPECT_THROW(server_.Add("a/b"), std::runtime_error);
-    const SimulatorInfo info = Describe(name_);
-    EXPECT_TRUE(info.usable);
-    EXPECT_EQ(getpid(), info.processId);
-    EXPECT_EQ(geteuid(), info.userId);
-
-    Platform::ErrorCode error = Errors::Success;
-    for (const char* const unknown : {"simulated-nobody", "simulated-", "simulated-a/b", "usb-1-1"}) {
-        EXPECT_EQ(nullptr, SimulatorBus().Open(unknown, error)) << unknown;
-        EXPECT_EQ(Errors::FileNotFound, error) << unknown;
+    for (const std::string& refused : {name_, std::string("a/b"), std::string(), std::string(65, 'x')}) {
+        EXPECT_THROW(server_.Add(refused), std::runtime_error) << refused;
     }
+    server_.Add(std::string(64, 'x'));
+    EXPECT_TRUE(Listed(std::string(64, 'x')));
+
+    const auto before = TestSupport::ResourceCount::TakeSettled();
+    for (int round = 0; round < 3; ++round) {
+        EXPECT_TRUE(Listed(name_));
+        const SimulatorInfo info = Describe(name_);
+        EXPECT_TRUE(info.usable && info.answers);
+        EXPECT_EQ(getpid(), info.processId);
+        EXPECT_EQ(geteuid(), info.userId);
+        for (const char* const unknown : {"nobody", "", "a/b"}) {
+            Open(unknown, Errors::FileNotFound);
+        }
+        EXPECT_FALSE(SimulatorBus().Has(name_)) << "the prefix is a part of the name";
+    }
+    EXPECT_TRUE(before.Settles()) << before << " before, " << TestSupport::ResourceCount::Take() << " after";
 }
 
-TEST_F(UsbIpServerTest, MemoryTravelsBothWays) {
-    const auto instrument = server_.Add(name_);
+/// A megabyte does not go into a socket at once.
+TEST_F(UsbIpServerTest, DataTravelBothWaysWhole) {
+    constexpr std::uint32_t piece = 1U << 20U;
+    InstrumentSettings settings;
+    settings.scanBytes = 3 * piece + 1000;
+    const auto instrument = server_.Add(name_, settings);
     const auto device = Open(name_);
     Platform::ErrorCode error = Errors::Busy;
     const auto endpoints = device->Endpoints(error);
@@ -112,21 +126,9 @@ TEST_F(UsbIpServerTest, MemoryTravelsBothWays) {
     EXPECT_FALSE(instrument->Claimed()) << "the question for the endpoints has ended its claim";
     ASSERT_EQ(Errors::Success, device->Claim());
     Do(*device, TestTransfer::Memory(Request::WriteEeprom, 300, 3));
-    for (const Bytes& sent : {Bytes{1, 2, 3}, Bytes{0}, Bytes{0}}) {
-        Do(*device, TestTransfer::Out(BulkOutEndpoint, sent));
-    }
-    Do(*device, TestTransfer::Memory(Request::ReadEeprom, 299, 5));
-    const Bytes memory = Do(*device, TestTransfer::In(BulkInEndpoint, 5));
-    EXPECT_EQ((Bytes{1, 2, 3}), Bytes(memory.begin() + 1, memory.begin() + 4));
-}
-
-/// A megabyte does not go into a socket at once.
-TEST_F(UsbIpServerTest, LargeTransfersArriveWhole) {
-    constexpr std::uint32_t piece = 1U << 20U;
-    InstrumentSettings settings;
-    settings.scanBytes = 3 * piece + 1000;
-    const auto instrument = server_.Add(name_, settings);
-    const auto device = OpenAndClaim(name_);
+    Do(*device, TestTransfer::Out(BulkOutEndpoint, {1, 2, 3}));
+    Do(*device, TestTransfer::Memory(Request::ReadEeprom, 300, 3));
+    EXPECT_EQ((Bytes{1, 2, 3}), Do(*device, TestTransfer::In(BulkInEndpoint, 3)));
     Do(*device, TestTransfer::Vendor(Request::Measure, {}));
     Bytes all;
     for (std::size_t before = 0; all.empty() || all.size() - before == piece;) {
@@ -139,12 +141,12 @@ TEST_F(UsbIpServerTest, LargeTransfersArriveWhole) {
 }
 
 TEST_F(UsbIpServerTest, OneProgramAtATime) {
-    const auto instrument = server_.Add(name_);
+    server_.Add(name_);
     const auto first = OpenAndClaim(name_);
     const auto second = Open(name_);
     EXPECT_EQ(Errors::Busy, second->Claim());
-    EXPECT_NE(std::string::npos, Describe(name_).usedBy.find("process " + std::to_string(getpid())))
-        << Describe(name_).usedBy;
+    const std::string usedBy = Describe(name_).usedBy;
+    EXPECT_NE(std::string::npos, usedBy.find("process " + std::to_string(getpid()))) << usedBy;
     first->Release();
     EXPECT_EQ(Errors::Success, second->Claim()) << "free as soon as it is released";
     second->Release();
@@ -159,10 +161,7 @@ TEST_F(UsbIpServerTest, FaultsCrossTheConnection) {
         const auto device = OpenAndClaim(name_);
         for (const auto status :
              {TransferStatus::IoError, TransferStatus::Overflow, TransferStatus::Stalled}) {
-            TestTransfer failing = TestTransfer::In(BulkInEndpoint, 64);
-            device->Submit(failing);
-            ASSERT_TRUE(failing.Wait());
-            EXPECT_EQ(status, failing.status);
+            Do(*device, TestTransfer::In(BulkInEndpoint, 64), status);
         }
         ASSERT_EQ(Errors::Success, device->ClearHalt(BulkInEndpoint));
 
@@ -178,43 +177,31 @@ TEST_F(UsbIpServerTest, FaultsCrossTheConnection) {
         EXPECT_EQ(62U, late.actualLength);
 
         Do(*device, TestTransfer::Vendor(Request::Reset, {31}));
-        TestTransfer gone = TestTransfer::Vendor(Request::Reset, {31});
-        ASSERT_EQ(Errors::Success, device->Submit(gone));
-        ASSERT_TRUE(gone.Wait());
-        EXPECT_EQ(TransferStatus::DeviceGone, gone.status);
+        Do(*device, TestTransfer::Vendor(Request::Reset, {31}), TransferStatus::DeviceGone);
     }
 }
 
 TEST_F(UsbIpServerTest, PeerThatStopsWhereItIsDueIsGivenUp) {
-    const auto instrument = server_.Add(name_);
+    server_.Add(name_);
     const auto operation =
         UsbIp::Encode(UsbIp::OperationHeader{UsbIp::ProtocolVersion, UsbIp::Operation::ImportRequest, {}});
     const auto busId = UsbIp::EncodeBusId(Platform::Usb::SimulatorBusId);
-    Bytes import(operation.begin(), operation.end());
-    import.insert(import.end(), busId.begin(), busId.end());
     UsbIp::SubmitPacket submit;
-    submit.sequence = 1;
     submit.length = 8;
     submit.endpoint = BulkOutEndpoint;
     const auto packet = UsbIp::Encode(submit);
-    const auto imported = [&](std::size_t size) {
-        Bytes bytes = import;
-        bytes.insert(bytes.end(), packet.begin(), packet.begin() + static_cast<std::ptrdiff_t>(size));
-        return bytes;
-    };
-    struct Case {
-        const char* name;
-        Bytes sent;
-        bool mayStay;
-    };
-    for (const Case& test : {
-             Case{"sends nothing", {}, false},
-             Case{"amid an operation", Bytes(import.begin(), import.begin() + 3), false},
-             Case{"amid an import", Bytes(import.begin(), import.begin() + 8), false},
-             Case{"amid a packet", imported(47), false},
-             Case{"before a payload", imported(48), false},
-             Case{"after an import", imported(0), true},
+    Bytes whole(operation.begin(), operation.end());
+    whole.insert(whole.end(), busId.begin(), busId.end());
+    whole.insert(whole.end(), packet.begin(), packet.end());
+    for (const auto& [name, size, mayStay] : std::vector<std::tuple<const char*, std::size_t, bool>>{
+             {"sends nothing", 0, false},
+             {"amid an operation", 3, false},
+             {"amid an import", 8, false},
+             {"after an import", 40, true},
+             {"amid a packet", 87, false},
+             {"before a payload", 88, false},
          }) {
+        SCOPED_TRACE(name);
         const int file = Platform::Usb::ConnectToSimulator(name_);
         ASSERT_GE(file, 0);
         const auto isOpen = [&] {
@@ -226,62 +213,31 @@ TEST_F(UsbIpServerTest, PeerThatStopsWhereItIsDueIsGivenUp) {
             }
             return count != 0;
         };
-        send(file, test.sent.data(), test.sent.size(), MSG_NOSIGNAL);
-        EXPECT_TRUE(isOpen()) << test.name;
+        send(file, whole.data(), size, MSG_NOSIGNAL);
+        EXPECT_TRUE(isOpen());
         server_.Advance(4'000'000);
-        EXPECT_TRUE(isOpen()) << test.name;
+        EXPECT_TRUE(isOpen());
         server_.Advance(2'000'000);
-        EXPECT_EQ(test.mayStay, isOpen()) << test.name;
+        EXPECT_EQ(mayStay, isOpen());
         close(file);
         server_.Advance(0);
     }
 }
 
-TEST_F(UsbIpServerTest, TcpOffersAllOfThem) {
-    const std::string other = ServerThread::UniqueName("b");
-    server_.Add(name_);
-    server_.Add(other);
-    std::uint16_t port = 0;
-    server_.Do([&] { port = server_.Server().ListenTcp(0); });
-    const Platform::Usb::UsbIpConnector connect = [port](Platform::ErrorCode&) {
-        const int file = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
-        sockaddr_in address{};
-        address.sin_family = AF_INET;
-        address.sin_port = htons(port);
-        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-        EXPECT_EQ(0, ::connect(file, reinterpret_cast<sockaddr*>(&address), sizeof address));
-        return file;
-    };
-    const auto records = Platform::Usb::ListUsbIpDevices(connect);
-    ASSERT_TRUE(records);
-    ASSERT_EQ(2U, records->size());
-    EXPECT_EQ("1-1", (*records)[0].busId);
-    EXPECT_EQ("1-2", (*records)[1].busId);
-    EXPECT_EQ("/simulated/" + other, (*records)[1].path);
-    EXPECT_NE((*records)[0].DeviceId(), (*records)[1].DeviceId());
-
-    const auto overTcp = Platform::Usb::MakeUsbIpDevice(connect, "1-2");
-    EXPECT_EQ(Errors::Success, overTcp->Claim());
-    Do(*overTcp, TestTransfer::Vendor(Request::Reset, {31}));
-    EXPECT_EQ(Errors::Busy, Open(other)->Claim()) << "one import, whichever way it came";
-    EXPECT_EQ(Errors::Success, Open(name_)->Claim());
-    EXPECT_EQ(Errors::DeviceNotConnected, Platform::Usb::MakeUsbIpDevice(connect, "1-3")->Claim());
-}
-
 TEST_F(UsbIpServerTest, StoppedSimulatorHoldsUpNobody) {
     const int listener = Platform::Usb::ListenAsSimulator(name_);
     ASSERT_GE(listener, 0);
-    SimulatorInfo info = Describe(name_);
-    EXPECT_TRUE(info.usable);
-    EXPECT_FALSE(info.answers);
+    const auto facts = [this] {
+        const SimulatorInfo info = Describe(name_);
+        return std::pair(info.usable, info.answers);
+    };
+    EXPECT_EQ(facts(), std::pair(true, false));
     for (int i = 0, file = 0; i < 1000 && file >= 0; ++i) {
         file = Platform::Usb::ConnectToSimulator(name_);
         close(file);
     }
     EXPECT_FALSE(Listed(name_)) << "it takes no more connections";
-    info = Describe(name_);
-    EXPECT_FALSE(info.usable);
-    EXPECT_FALSE(info.answers);
+    EXPECT_EQ(facts(), std::pair(false, false));
     close(listener);
 }
 
@@ -294,27 +250,24 @@ TEST_F(UsbIpServerTest, AnotherUsersSimulatorIsSeenAndNotUsed) {
     ASSERT_EQ(0, pipe(ready));
     const pid_t child = fork();
     if (child == 0) {
-        const bool listening = setuid(nobody) == 0 && Platform::Usb::ListenAsSimulator(name_) >= 0;
-        const char answer = listening ? 'y' : 'n';
-        const bool told = write(ready[1], &answer, 1) == 1;
-        pause();
-        _exit(told ? 0 : 1);
+        if (setuid(nobody) == 0 && Platform::Usb::ListenAsSimulator(name_) >= 0 &&
+            write(ready[1], "y", 1) == 1) {
+            pause();
+        }
+        _exit(1);
     }
+    close(ready[1]);
     char answer = 'n';
     ASSERT_EQ(1, read(ready[0], &answer, 1));
-    ASSERT_EQ('y', answer);
     EXPECT_FALSE(Listed(name_));
     const SimulatorInfo info = Describe(name_);
     EXPECT_FALSE(info.usable);
     EXPECT_EQ(nobody, info.userId);
     EXPECT_EQ(child, info.processId);
-    Platform::ErrorCode error = Errors::Success;
-    EXPECT_EQ(nullptr, SimulatorBus().Open("simulated-" + name_, error));
-    EXPECT_EQ(Errors::AccessDenied, error);
+    Open(name_, Errors::AccessDenied);
     kill(child, SIGKILL);
     waitpid(child, nullptr, 0);
     close(ready[0]);
-    close(ready[1]);
 }
 
 }  // namespace

@@ -177,6 +177,8 @@ TEST_F(OverlappedFiles, RefuseHandlesThatNameNothing) {
         EXPECT_FALSE(files_->CloseFile(handle));
         EXPECT_EQ(Platform::LastError(), Errors::InvalidHandle);
     }
+    EXPECT_FALSE(files_->StartRead(reopened, nullptr, 1, request_.record));
+    EXPECT_EQ(Platform::LastError(), Errors::InvalidParameter);
     EXPECT_FALSE(Platform::Close(reopened)) << "not a waitable object";
     EXPECT_EQ(Platform::Wait(reopened, 0), WaitResult::Failed);
 }
