@@ -34,15 +34,11 @@ TEST_P(InstrumentCommandsTest, List) {
                                "\",\"instruments\":[{\"identifier\":\"" + Identifier("sim-a") +
                                "\",\"name\":\"sim-a\"},{\"identifier\":\"" + Identifier("sim-b") +
                                "\",\"name\":\"sim-b\"}]}\n");
-}
-
-TEST_P(InstrumentCommandsTest, TheTransportCanBeChosenAndIsGivenBack) {
-    host_.Add("sim");
     const Transport other = GetParam() == Transport::Native ? Transport::UsbIo : Transport::Native;
     Succeed({"identify", "--transport", Name(other), "--json"});
-    EXPECT_EQ(tool_.Json()["identifier"], std::string(Name(other)) + "/sim");
+    EXPECT_EQ(tool_.Json()["identifier"], std::string(Name(other)) + "/sim-a");
     Succeed({"identify", "--json"});
-    EXPECT_EQ(tool_.Json()["identifier"], Identifier());
+    EXPECT_EQ(tool_.Json()["identifier"], Identifier("sim-a")) << "the choice was for one command";
 }
 
 /// All forms of one readout hold the same values.
@@ -53,17 +49,17 @@ TEST_P(InstrumentCommandsTest, ReadoutForms) {
     EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 1u);
     const auto bytes = ReadFile(folder_.Path("raw"));
     ASSERT_EQ(bytes.size(), 256u);
+    const auto values = Interface::ReadoutFromBytes(std::span<const std::uint8_t, 256>(bytes.data(), 256));
     host_.Add("sim");  // the same noise once more for each
     Succeed({"readout", "--json"});
-    const std::vector<int> values = tool_.Json()["values"];
-    const auto expected = Interface::ReadoutFromBytes(std::span<const std::uint8_t, 256>(bytes.data(), 256));
-    EXPECT_TRUE(std::equal(values.begin(), values.end(), expected.begin()));
+    EXPECT_THAT(tool_.Json()["values"].get<std::vector<int>>(), testing::ElementsAreArray(values));
 
     host_.Add("sim");
     Succeed({"readout", "--csv"});
-    std::string csv = "1,0.000";
-    for (const int value : values) {
-        csv += "," + std::to_string(value);
+    std::string csv = "1,0.000", table;
+    for (std::size_t i = 0; i < values.size(); ++i) {
+        csv += "," + std::to_string(values[i]);
+        table += (i % 8 == 0 ? " " + std::to_string(i) + ":" : "") + " " + std::to_string(values[i]);
     }
     ASSERT_EQ(tool_.Lines().size(), 2u);
     EXPECT_TRUE(tool_.Lines()[0].starts_with("readout,seconds,0,1,2,"));
@@ -73,91 +69,60 @@ TEST_P(InstrumentCommandsTest, ReadoutForms) {
 
     host_.Add("sim");
     Succeed({"readout"});
-    ASSERT_EQ(tool_.Lines().size(), 17u);
+    EXPECT_EQ(tool_.Lines().size(), 17u);
     std::istringstream printed(tool_.Out());
-    for (std::size_t i = 0; i < values.size(); ++i) {
-        if (std::string index; i % 8 == 0) {
-            printed >> index;
-            EXPECT_EQ(index, std::to_string(i) + ":");
-        }
-        int value = 0;
-        printed >> value;
-        EXPECT_EQ(value, values[i]) << i;
+    std::string words;
+    for (std::string word; printed >> word && word != "lowest";) {
+        words += " " + word;
     }
+    EXPECT_TRUE(words.starts_with(table)) << words;
 }
 
-/// What the numbers were taken with, and when.
+/// What the numbers were taken with, and when: from start to start.
 TEST_P(InstrumentCommandsTest, ReadoutsSayWhatTheyWereTakenWith) {
     struct Case {
-        std::uint16_t firmware;
         Arguments options;
         nlohmann::json parameters;
         double time;
+        int mode;
+        int interval = 60;
+        std::size_t repeat = 2;
+        std::uint16_t firmware = InstrumentSettings().firmware;
     };
-    InstrumentSettings settings;
-    const std::uint16_t usual = settings.firmware;
     for (const Case& row : {
-             Case{usual, {}, {294, 0, 1, 6}, 294 * 68e-6},
-             Case{usual, {"--parameters", "7,1,2,3"}, {7, 1, 2, 3}, 7 * 68e-6},
-             Case{usual, {"--integration-time", "0.005"}, {147, 0, 1, 6}, 147 * 34e-6},
-             Case{usual, {}, {294, 0, 1, 6}, 294 * 68e-6},
-             Case{300, {}, {294, 0, 1, 6}, 294 * 68e-6},
+             Case{{}, {294, 0, 1, 6}, 294 * 68e-6, 1, 86340, 52},  // longer than 32 bits count milliseconds
+             Case{{"--parameters", "7,1,2,3"}, {7, 1, 2, 3}, 7 * 68e-6, 1},
+             Case{{"--integration-time", "0.5"}, {7353, 0, 1, 6}, 7353 * 68e-6, 1},
+             Case{{"--integration-time", "0.005"}, {147, 0, 1, 6}, 147 * 34e-6, 2},
+             Case{{}, {294, 0, 1, 6}, 294 * 68e-6, 1, 60, 2, 300},
          }) {
+        InstrumentSettings settings = Leisurely();
         settings.firmware = row.firmware;
-        host_.Add("sim", settings);
+        auto& instrument = host_.Add("sim", settings);
         Arguments arguments = row.options;
-        arguments.insert(arguments.begin(), {"readout", "--json", "--repeat", "2", "--interval", "60"});
+        arguments.insert(arguments.begin(), {"readout", "--json", "--repeat", std::to_string(row.repeat),
+                                             "--interval", std::to_string(row.interval)});
         Succeed(arguments);
-        ASSERT_EQ(tool_.Lines().size(), 2u);
+        EXPECT_EQ(tool_.Lines().size(), row.repeat);
+        EXPECT_EQ(ModeOf(instrument), row.mode);
+        int number = 0;
+        int firstMinute = 0;
         for (const std::string& line : tool_.Lines()) {
             const auto readout = nlohmann::json::parse(line);
             EXPECT_EQ(readout["parameters"], row.parameters);
             EXPECT_NEAR(readout["integrationTime"], row.time, 1e-9);
-            EXPECT_THAT(readout["time"].get<std::string>(),
-                        testing::MatchesRegex("20..-..-..T..:..:..\\.......:.."));
+            EXPECT_NEAR(readout["seconds"], row.interval * number, 0.01);
+            const std::string time = readout["time"];
+            EXPECT_THAT(time, testing::MatchesRegex("20..-..-..T..:..:..\\.......:.."));
+            const int minute = std::stoi(time.substr(14, 2));
+            firstMinute = number == 0 ? minute : firstMinute;
+            EXPECT_EQ(minute, (firstMinute + number * row.interval / 60) % 60);
+            EXPECT_EQ(readout["readout"], ++number);
         }
-        const auto minute = [this](std::size_t line) {
-            const std::string time = nlohmann::json::parse(tool_.Lines()[line])["time"];
-            return std::stoi(time.substr(14, 2));
-        };
-        EXPECT_EQ((minute(0) + 1) % 60, minute(1));
     }
-}
-
-TEST_P(InstrumentCommandsTest, ReadoutPlotsInTheCharactersOfTheTerminal) {
     host_.Add("sim");
-    Succeed({"readout", "--plot"});
-    EXPECT_THAT(tool_.Out(), HasSubstr("*"));
-    EXPECT_EQ(tool_.Out().find("\xE2\xA0"), std::string::npos);
-    tool_.outFacts.showsUtf8 = true;
-    Succeed({"readout", "--plot"});
-    EXPECT_EQ(tool_.Out().find('*'), std::string::npos);
-    EXPECT_THAT(tool_.Out(), HasSubstr("\xE2\xA0"));
-    Succeed({"readout", "--plot", "--ascii"});
-    EXPECT_EQ(tool_.Out().find("\xE2\xA0"), std::string::npos);
-}
-
-TEST_P(InstrumentCommandsTest, ReadoutRepeatsFromStartToStart) {
-    host_.Add("sim", Leisurely());
-    struct Case {
-        const char* repeat;
-        const char* interval;
-    };
-    std::vector<Case> cases{{"3", "2"}};
-    if (clock_.IsVirtual()) {
-        cases.push_back({"52", "86400"});  // longer than 32 bits count milliseconds
-    }
-    for (const Case& row : cases) {
-        Succeed({"readout", "--json", "--repeat", row.repeat, "--interval", row.interval});
-        const auto lines = tool_.Lines();
-        ASSERT_EQ(lines.size(), std::stoul(row.repeat));
-        for (std::size_t i = 0; i < lines.size(); ++i) {
-            const auto line = nlohmann::json::parse(lines[i]);
-            EXPECT_EQ(line["readout"], i + 1);
-            EXPECT_NEAR(line["seconds"], std::stod(row.interval) * static_cast<double>(i),
-                        clock_.IsVirtual() ? 0.01 : 0.5);
-        }
-    }
+    Fail({"readout", "--integration-time", "60"}, ExitCode::BadData, "Integration time too high");
+    EXPECT_THAT(tool_.Err(), HasSubstr("mode 2: 0.00442 s to 2.22819 s"));
 }
 
 /// A failure and Ctrl-C alike; before the first readout there is nothing to keep. What was there is replaced
@@ -172,52 +137,55 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
         std::ptrdiff_t lines;
     };
     constexpr std::uint64_t never = 90'000'000;
-    for (const bool existed : {false, true}) {
-        for (const Case& row : {
-                 Case{"2", "", never, ExitCode::Success, "2 readouts in 1.", 3},
-                 Case{"5", "bulk-in 2:stall", never, ExitCode::InputOutput, "; 2 readouts were written", 3},
-                 Case{"5", "", 2'500'000, ExitCode::Interrupted, "interrupted; 2 readouts were written", 3},
-                 Case{"0", "", 1'500'000, ExitCode::Success, "1 readout in ", 2},
-                 Case{"0", "", 500'000, ExitCode::Success, "interrupted; nothing was recorded", 0},
-                 Case{"5", "bulk-in 0:stall", never, ExitCode::InputOutput, "; nothing was recorded", 0},
-             }) {
-            SCOPED_TRACE(row.text);
-            host_.Add("sim", Leisurely());
-            SetFaults(row.faults);
-            if (existed) {
-                WriteFile(folder_.Path("csv"), {1});
-            }
-            Service::Interruption interruption;
-            tool_.interruption = &interruption;
-            const auto event = After(row.interruptedAt, [&] { interruption.Request(); });
-            Fail({"readout", "--csv", "--repeat", row.repeat, "--interval", "1", "--output",
-                  folder_.Path("csv")},
-                 row.code, row.text);
-            Platform::ClockScheduler().Forget(event);
-            const bool isComplete = row.code == ExitCode::Success && row.lines > 0;
-            const std::string kept = folder_.Path(existed && !isComplete ? "csv.part" : "csv");
-            const auto content = row.lines > 0 ? ReadFile(kept) : std::vector<std::uint8_t>();
-            EXPECT_EQ(std::count(content.begin(), content.end(), '\n'), row.lines);
-            EXPECT_EQ(std::filesystem::remove(kept), row.lines > 0);
-            EXPECT_EQ(folder_.Files().size(), existed && !isComplete ? 1u : 0u);
-            EXPECT_TRUE(!existed || isComplete ||
-                        ReadFile(folder_.Path("csv")) == std::vector<std::uint8_t>{1});
-        }
+    for (const Case& row : {
+             Case{"2", "", never, ExitCode::Success, "2 readouts in 1.", 3},
+             Case{"5", "bulk-in 2:stall", never, ExitCode::InputOutput, "; 2 readouts were written", 3},
+             Case{"5", "", 2'500'000, ExitCode::Interrupted, "interrupted; 2 readouts were written", 3},
+             Case{"0", "", 1'500'000, ExitCode::Success, "1 readout in ", 2},
+             Case{"0", "", 500'000, ExitCode::Success, "interrupted; nothing was recorded", 0},
+             Case{"5", "bulk-in 0:stall", never, ExitCode::InputOutput, "; nothing was recorded", 0},
+         }) {
+        SCOPED_TRACE(row.text);
+        host_.Add("sim", Leisurely());
+        SetFaults(row.faults);
+        WriteFile(folder_.Path("csv"), {1});
+        Service::Interruption interruption;
+        tool_.interruption = &interruption;
+        const auto event = After(row.interruptedAt, [&] { interruption.Request(); });
+        Fail({"readout", "--csv", "--repeat", row.repeat, "--interval", "1", "--output", folder_.Path("csv")},
+             row.code, row.text);
+        Platform::ClockScheduler().Forget(event);
+        const bool isReplaced = row.code == ExitCode::Success && row.lines > 0;
+        const std::string kept = folder_.Path(isReplaced ? "csv" : "csv.part");
+        const auto content = row.lines > 0 ? ReadFile(kept) : std::vector<std::uint8_t>();
+        EXPECT_EQ(std::count(content.begin(), content.end(), '\n'), row.lines);
+        EXPECT_EQ(std::filesystem::remove(kept), row.lines > 0);
+        EXPECT_EQ(folder_.Files().size(), isReplaced ? 0u : 1u);
+        EXPECT_TRUE(isReplaced || ReadFile(folder_.Path("csv")) == std::vector<std::uint8_t>{1});
     }
 }
 
-TEST_P(InstrumentCommandsTest, ALivePlotFitsOnItsTerminalAndIsDrawnOver) {
+TEST_P(InstrumentCommandsTest, PlotsUseWhatTheTerminalHas) {
     host_.Add("sim", Leisurely());
+    const auto isBraille = [this](const Arguments& arguments) {
+        Succeed(arguments);
+        EXPECT_NE(tool_.Out().find('*') != std::string::npos,
+                  tool_.Out().find("\xE2\xA0") != std::string::npos);
+        return tool_.Out().find('*') == std::string::npos;
+    };
+    EXPECT_FALSE(isBraille({"readout", "--plot"}));
+    tool_.outFacts.showsUtf8 = true;
+    EXPECT_TRUE(isBraille({"readout", "--plot"}));
+    EXPECT_FALSE(isBraille({"readout", "--plot", "--ascii"}));
+
     tool_.outFacts.isTerminal = true;
-    Succeed({"readout", "--plot", "--repeat", "3"});
+    Succeed({"readout", "--plot", "--ascii", "--repeat", "3"});
     EXPECT_EQ(tool_.Out().find('\x1b'), std::string::npos) << "a terminal that cannot be drawn on";
     tool_.outFacts.movesCursor = true;
-    for (const Cli::TerminalSize size :
-         {Cli::TerminalSize{20, 24}, Cli::TerminalSize{40, 10}, Cli::TerminalSize{132, 50}}) {
+    for (const Cli::TerminalSize size : {Cli::TerminalSize{20, 24}, {40, 10}, {132, 50}}) {
         tool_.outFacts.size = [size] { return size; };
-        Succeed({"readout", "--plot", "--repeat", "3"});
-        int lines = 0;
-        int drawnOver = 0;
+        Succeed({"readout", "--plot", "--ascii", "--repeat", "3"});
+        int lines = 0, drawnOver = 0;
         for (const std::string& line : tool_.Lines()) {
             if (line.starts_with("\r\x1b[")) {
                 EXPECT_TRUE(line.starts_with("\r\x1b[" + std::to_string(lines) + "A\x1b[J"));
@@ -247,51 +215,46 @@ TEST_P(InstrumentCommandsTest, OutputThatCannotBeWrittenEndsACommandAtOnce) {
         Fail(command, ExitCode::File, "the output cannot be written");
         watch.ExpectAtMost(5000);
         Platform::ClockScheduler().Forget(event);
-        EXPECT_EQ(instrument.PendingTransfers(), 0u);
     }
 }
 
-TEST_P(InstrumentCommandsTest, ReadoutWithAnIntegrationTimeChoosesTheMode) {
-    auto& instrument = host_.Add("sim");
-    Succeed({"readout", "--integration-time", "0.5"});
-    EXPECT_EQ(ModeOf(instrument), 1);
-    EXPECT_EQ(ParametersOf(instrument), (Simulator::MeasureParameters{7353, 0, 1, 6}));  // of 68 us
-    Succeed({"readout", "--integration-time", "0.005"});
-    EXPECT_EQ(ModeOf(instrument), 2);
-    EXPECT_EQ(ParametersOf(instrument).p1, 147);  // of 34 us
-    Fail({"readout", "--integration-time", "60"}, ExitCode::BadData, "Integration time too high");
-    EXPECT_THAT(tool_.Err(), HasSubstr("mode 2: 0.00442 s to 2.22819 s"));
-    EXPECT_EQ(ModeOf(instrument), 2);
-}
-
-TEST_P(InstrumentCommandsTest, Identify) {
+TEST_P(InstrumentCommandsTest, IdentifyAndReset) {
     InstrumentSettings settings;
     settings.firmware = 305;
-    host_.Add("sim", settings);
+    auto& instrument = host_.Add("sim", settings);
     Succeed({"identify", "--json"});
-    const auto found = tool_.Json();
-    EXPECT_EQ(found["identifier"], Identifier());
-    EXPECT_EQ(found["name"], "sim");
-    EXPECT_EQ(found["chipId"], "5a0123456789abcd");
-    EXPECT_EQ(found["misc"], (nlohmann::json{0x21, 305, 0x43, 0x0506, 0x0708}));
+    auto found = tool_.Json();
     EXPECT_EQ(found["mode"][0], 3);
     EXPECT_EQ(found["parameters"][4], 0x55);
+    for (const char* checked : {"mode", "parameters", "cpld"}) {
+        found.erase(checked);
+    }
+    EXPECT_EQ(found, (nlohmann::json{{"identifier", Identifier()},
+                                     {"name", "sim"},
+                                     {"chipId", "5a0123456789abcd"},
+                                     {"misc", {0x21, 305, 0x43, 0x0506, 0x0708}}}));
     Succeed({"identify"});
     EXPECT_THAT(tool_.Out(), HasSubstr("5a0123456789abcd"));
-}
-
-TEST_P(InstrumentCommandsTest, ResetSendsItsCodeAfterTheOneOfTheOpening) {
-    auto& instrument = host_.Add("sim");
     Succeed({"reset", "--code", "017"});
     instrument.WithCommands([](const Simulator::Commands& commands) {
         EXPECT_EQ(commands.lastResetCode, 17) << "a leading zero means nothing";
-        EXPECT_EQ(commands.resets, 2u);
+        EXPECT_EQ(commands.resets, 4u) << "each opening resets it as well";
     });
     Fail({"reset", "--code", "256"}, ExitCode::Usage);
 }
 
-TEST_P(InstrumentCommandsTest, MonitorReportsButtonAndRemoval) {
+TEST_P(InstrumentCommandsTest, MonitorReportsButtonAndRemovalAndEndsInTime) {
     auto& instrument = host_.Add("sim");
+    const Stopwatch watch(clock_);
+    Succeed({"monitor", "--for", "3"});
+    watch.ExpectBetween(3000, 3100);
+    EXPECT_EQ(tool_.Out(), "");
+    Service::Interruption interruption;
+    tool_.interruption = &interruption;
+    After(1'000'000, [&] { interruption.Request(); });
+    Succeed({"monitor"});
+    EXPECT_EQ(tool_.Out(), "") << "an end that the user wants is no removal";
+    tool_.interruption = nullptr;
     After(1'000'000, [&] { instrument.PressButton(); });
     After(2'000'000, [&] { host_.Bus().Unplug("sim"); });
     Succeed({"monitor", "--json"});
@@ -302,43 +265,15 @@ TEST_P(InstrumentCommandsTest, MonitorReportsButtonAndRemoval) {
     EXPECT_EQ(nlohmann::json::parse(tool_.Lines()[1])["event"], "removed");
 }
 
-TEST_P(InstrumentCommandsTest, MonitorEndsInTimeAndWithCtrlC) {
-    host_.Add("sim");
-    const Stopwatch watch(clock_);
-    Succeed({"monitor", "--for", "3"});
-    watch.ExpectBetween(3000, 3100);
-    EXPECT_EQ(tool_.Out(), "");
-    Service::Interruption interruption;
-    tool_.interruption = &interruption;
-    After(1'000'000, [&] { interruption.Request(); });
-    Succeed({"monitor"});
-    EXPECT_EQ(tool_.Out(), "") << "an end that the user wants is no removal";
-}
-
-TEST_P(InstrumentCommandsTest, WriteImageWritesTheBytesAsTheyAre) {
-    auto& instrument = host_.Add("sim");
-    std::vector<std::uint8_t> image(8192);
-    for (std::size_t i = 0; i < image.size(); ++i) {
-        image[i] = static_cast<std::uint8_t>(i * 7 + i / 256);
-    }
-    WriteFile(folder_.Path("image"), image);
-    Succeed({"write-image", folder_.Path("image")});
-    EXPECT_EQ(instrument.Eeprom(), image);
-    Fail({"write-image", folder_.Path("missing")}, ExitCode::File);
-    EXPECT_EQ(instrument.Eeprom(), image);
-}
-
 TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
     host_.Add("left");
     host_.Add("right");
     Fail({"identify", "--device", "up"}, ExitCode::NoInstrument, Identifier("right"));
-    Succeed({"identify", "--device", "ight", "--json"});
-    EXPECT_EQ(tool_.Json()["name"], "right");
-    EXPECT_EQ(tool_.Err(), "");
     Succeed({"identify", "--json"});
     EXPECT_EQ(tool_.Json()["name"], "left");
     EXPECT_THAT(tool_.Err(), HasSubstr("taking " + Identifier("left")));
     for (const Arguments& arguments : std::vector<Arguments>{
+             {"identify", "--device", "ight", "--json"},
              {"-d", "right", "identify", "--json"},
              {"--device=right", "--transport", Name(GetParam()), "identify", "--json"},
              {"-d", "right", "identify", "--json", "-d", "right"},
@@ -346,15 +281,16 @@ TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
          }) {
         Succeed(arguments);
         EXPECT_EQ(tool_.Json()["identifier"], Identifier("right"));
+        EXPECT_EQ(tool_.Err(), "");
     }
-    const std::pair<Arguments, const char*> refused[] = {
-        {{"-d", "left", "identify", "-d", "right"}, "--device is given twice: left and right"},
-        {{"-d", "left", "list"}, "--device means nothing to `ostra list`"},
-        {{"list", "-d", "left"}, "--device means nothing to `ostra list`"},
-        {{"-d", "left", "eeprom", "check", "image"}, "--device excludes --image"},
-        {{"--transport", "serial", "list"}, "serial"},
-    };
-    for (const auto& [arguments, text] : refused) {
+    for (const auto& [arguments, text] : std::vector<std::pair<Arguments, const char*>>{
+             {{"-d", "left", "identify", "-d", "right"}, "--device is given twice: left and right"},
+             {{"-d", "left", "list"}, "--device means nothing to `ostra list`"},
+             {{"list", "-d", "left"}, "--device means nothing to `ostra list`"},
+             {{"-d", "left", "eeprom", "check", "image"}, "--device excludes --image"},
+             {{"--transport", "serial", "list"}, "serial"},
+             {{"identify", "-d", "chip:5a"}, "16 hexadecimal digits"},
+         }) {
         Fail(arguments, ExitCode::Usage, text);
     }
 }
@@ -380,9 +316,7 @@ TEST_P(InstrumentCommandsTest, ChipsTellInstrumentsApart) {
     Fail({"identify", "-d", "chip:5a0123456789abcd"}, ExitCode::NotAvailable,
          Identifier("left") + ": the instrument is used");
     left.Release();
-
     Fail({"identify", "-d", "chip:5a0123456789abce"}, ExitCode::NoInstrument, "chip:5a0123456789abce");
-    Fail({"identify", "-d", "chip:5a"}, ExitCode::Usage, "16 hexadecimal digits");
     host_.Bus().SetFaults("left", Simulator::FaultPlan::Parse("control 0+:stall"));
     Fail({"list", "--chip-id", "--json"}, ExitCode::InputOutput, Identifier("left"));
     EXPECT_EQ(tool_.Json()["instruments"].size(), 2u);
@@ -391,88 +325,84 @@ TEST_P(InstrumentCommandsTest, ChipsTellInstrumentsApart) {
 TEST_P(InstrumentCommandsTest, VerboseTellsWhatIsSent) {
     host_.Add("sim");
     const auto told = [this] {
-        std::vector<std::string> lines;
+        std::string lines;
         std::istringstream stream(tool_.Log());
         for (std::string line; std::getline(stream, line);) {
             if (!line.starts_with("ostra: interrupt ")) {  // is waiting for the button meanwhile
-                lines.push_back(line);
+                lines += line + "\n";
             }
         }
         return lines;
     };
     Succeed({"readout", "--verbose"});
-    std::vector<std::string> expected{"ostra: Reset code=31",
-                                      "ostra: SetMeasureParameters p1=294 p2=0 p3=1 p4=6", "ostra: Measure",
-                                      "ostra: bulk in 256 of 256"};
-    if (GetParam() == Transport::Native) {
-        expected.emplace_back("ostra: ButtonReport");  // of the closing
-    }
-    EXPECT_EQ(told(), expected);
+    EXPECT_EQ(told(),
+              std::string("ostra: Reset code=31\n"
+                          "ostra: SetMeasureParameters p1=294 p2=0 p3=1 p4=6\n"
+                          "ostra: Measure\n"
+                          "ostra: bulk in 256 of 256\n") +
+                  (GetParam() == Transport::Native ? "ostra: ButtonReport\n" : ""));  // of the closing
     SetFaults("bulk-in 0:stall");
     Fail({"-v", "readout"}, ExitCode::InputOutput, Identifier() + ": ");
-    EXPECT_THAT(told(),
-                testing::Contains(testing::StartsWith("ostra: bulk in 0 of 256: failed with code 0x")));
+    EXPECT_THAT(told(), HasSubstr("\nostra: bulk in 0 of 256: failed with code 0x"));
 }
 
 TEST(CommandLineTest, UsageErrorsGoToStandardError) {
     ToolRunner tool;
-    for (const Arguments& arguments : std::vector<Arguments>{
-             {},
-             {"no-such-command"},
-             {"eeprom"},
-             {"eeprom", "check", ""},
-             {"identify", "--device", ""},
-             {"readout", "--no-such-option"},
-             {"readout", "--repeat", "-1"},
-             {"readout", "--parameters", "1,2,3"},
-             {"readout", "--parameters", "1,2,3,256"},
-             {"readout", "--parameters", "1,2,3,4", "--integration-time", "1"},
-             {"readout", "--integration-time", "0"},
-             {"readout", "--integration-time", "nan"},
-             {"readout", "--interval", "nan"},
-             {"monitor", "--for", "0"},
-             {"scan", "--records", "0"},
-             {"scan", "--total", "0"},
-             {"eeprom", "restore", "image", "--no-backup"},
-             {"scan", "--record-size", "6554"},
-             {"scan", "--record-size", "0"},
-             {"scan", "--total", "256", "--records", "1"},
-             {"scan", "--json"},
-             {"list", "--transport", "serial"},
-             {"write-image"},
+    for (const auto& [arguments, text] : std::vector<std::pair<Arguments, const char*>>{
+             {{}, ""},
+             {{"no-such-command"}, "`ostra` has no command 'no-such-command'"},
+             {{"eeprom"}, "`ostra eeprom --help`"},
+             {{"eeprom", "--no-such-option", "no-such-command"},
+              "`ostra eeprom` has no command 'no-such-command'"},
+             {{"help", "eeprom", "chekc"}, "`ostra eeprom` has no command 'chekc'"},
+             {{"eeprom", "check", ""}, ""},
+             {{"identify", "--device", ""}, ""},
+             {{"readout", "--no-such-option"}, ""},
+             {{"readout", "one", "two"}, "one two"},
+             {{"readout", "--repeat", "-1"}, ""},
+             {{"readout", "--parameters", "1,2,3"}, ""},
+             {{"readout", "--parameters", "1,2,3,256"}, ""},
+             {{"readout", "--parameters", "1,2,3,4", "--integration-time", "1"}, ""},
+             {{"readout", "--integration-time", "0"}, ""},
+             {{"readout", "--integration-time", "nan"}, ""},
+             {{"readout", "--interval", "nan"}, ""},
+             {{"monitor", "--for", "0"}, ""},
+             {{"scan", "--records", "0"}, ""},
+             {{"scan", "--total", "0"}, ""},
+             {{"scan", "--record-size", "6554"}, ""},
+             {{"scan", "--record-size", "0"}, ""},
+             {{"scan", "--record-size", "7"}, ""},
+             {{"scan", "--total", "256", "--records", "1"}, ""},
+             {{"scan", "--json"}, ""},
+             {{"scan", "--json", "--output", "-"}, ""},
+             {{"scan", "--discard"}, ""},
+             {{"scan", "--raw", "--header"}, ""},
+             {{"scan", "--raw", "--number"}, ""},
+             {{"scan", "--raw", "--time"}, ""},
+             {{"eeprom", "restore", "image", "--no-backup"}, ""},
+             {{"list", "--transport", "serial"}, ""},
+             {{"list", "--capture", ""}, ""},
+             {{"write-image"}, ""},
          }) {
         EXPECT_EQ(tool.Run(arguments), ExitCode::Usage) << testing::PrintToString(arguments);
         EXPECT_EQ(tool.Out(), "");
         EXPECT_NE(tool.Err(), "");
-    }
-    const std::pair<Arguments, const char*> texts[] = {
-        {{"no-such-command"}, "`ostra` has no command 'no-such-command'"},
-        {{"eeprom", "--no-such-option", "no-such-command"},
-         "`ostra eeprom` has no command 'no-such-command'"},
-        {{"readout", "one", "two"}, "one two"},
-        {{"eeprom"}, "`ostra eeprom --help`"},
-    };
-    for (const auto& [arguments, text] : texts) {
-        tool.Run(arguments);
         EXPECT_THAT(tool.Err(), HasSubstr(text));
     }
     EXPECT_EQ(tool.Run({"--help"}), ExitCode::Success);
     EXPECT_THAT(tool.Out(), HasSubstr("Exit codes:"));
-    for (const Arguments& command :
-         std::vector<Arguments>{{}, {"readout"}, {"eeprom"}, {"eeprom", "check"}}) {
+    for (const Arguments& command : std::vector<Arguments>{{}, {"readout"}, {"eeprom", "check"}}) {
         Arguments arguments = command;
         arguments.push_back("--help");
         tool.Run(arguments);
         const std::string help = tool.Out();
-        arguments = command;
+        arguments.pop_back();
         arguments.insert(arguments.begin(), "help");
         EXPECT_EQ(tool.Run(arguments), ExitCode::Success);
         EXPECT_EQ(tool.Out(), help);
     }
-    EXPECT_EQ(tool.Run({"help", "eeprom", "chekc"}), ExitCode::Usage);
-    EXPECT_THAT(tool.Err(), HasSubstr("`ostra eeprom` has no command 'chekc'"));
     EXPECT_EQ(tool.Run({"--version"}), ExitCode::Success);
-    EXPECT_EQ(tool.Out(), "ostra 1.0.3\n");
+    EXPECT_THAT(tool.Out(), testing::MatchesRegex("ostra [0-9.]+\n"));
 }
 
 #if !defined(_WIN32)
@@ -481,19 +411,15 @@ TEST(CommandLineTest, AWrongOneLeavesTheCaptureFileThatIsThere) {
     const std::string file = folder.Path("capture");
     WriteFile(file, {1});
     ToolRunner tool;
-    for (const Arguments& arguments : std::vector<Arguments>{
-             {"readout", "--no-such-option"},
-             {"write-image"},
-             {"scan", "--record-size", "7"},
-             {"calibration", "set", "1211"},
-             {"readout", "--device", "nobody"},
-         }) {
-        std::vector<std::string> withCapture{"--capture", file};
+    for (const Arguments& arguments : std::vector<Arguments>{{"readout", "--no-such-option"},
+                                                             {"scan", "--record-size", "7"},
+                                                             {"calibration", "set", "1211"},
+                                                             {"readout", "--device", "nobody"}}) {
+        Arguments withCapture{"--capture", file};
         withCapture.insert(withCapture.end(), arguments.begin(), arguments.end());
         EXPECT_NE(tool.Run(withCapture), ExitCode::Success) << testing::PrintToString(arguments);
         EXPECT_EQ(ReadFile(file), std::vector<std::uint8_t>{1}) << testing::PrintToString(arguments);
     }
-    EXPECT_EQ(tool.Run({"list", "--capture", ""}), ExitCode::Usage);
 }
 #endif
 

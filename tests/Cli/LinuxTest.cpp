@@ -37,25 +37,31 @@ class RegisterTest : public testing::Test {
     const std::string file_ = folder_.Path("rules.d/70-ostra.rules");
 };
 
-TEST_F(RegisterTest, WritesARuleForEachKindOnce) {
-    ASSERT_EQ(Register({"1209:00AB"}), ExitCode::Success) << tool_.Err();
-    ASSERT_EQ(Register({"04b4:1003"}), ExitCode::Success) << tool_.Err();
-    ASSERT_EQ(Register({"1209:00ab"}), ExitCode::Success) << tool_.Err();
-    const auto rule = [](const std::string& vendor, const std::string& product) {
-        return "SUBSYSTEM==\"usb\", ENV{DEVTYPE}==\"usb_device\", ATTR{idVendor}==\"" + vendor +
-               "\", ATTR{idProduct}==\"" + product +
-               "\", ENV{OSTRA_INTERFACE_CLASS}=\"1\", TAG+=\"uaccess\", MODE=\"0660\", GROUP=\"plugdev\"\n";
-    };
-    const std::string rules = Rules();
-    EXPECT_EQ(rules.substr(rules.find("SUBSYSTEM")), rule("1209", "00ab") + rule("04b4", "1003"));
+/// The rule of one kind of device, as it is written now or was once.
+std::string Rule(const std::string& vendor, const std::string& product,
+                 const char* end = ", MODE=\"0660\", GROUP=\"plugdev\"\n") {
+    return "SUBSYSTEM==\"usb\", ENV{DEVTYPE}==\"usb_device\", ATTR{idVendor}==\"" + vendor +
+           "\", ATTR{idProduct}==\"" + product + "\", ENV{OSTRA_INTERFACE_CLASS}=\"1\", TAG+=\"uaccess\"" +
+           end;
+}
+
+TEST_F(RegisterTest, WritesARuleForEachKindOnceAndTakesItBack) {
+    for (const char* id : {"1209:00AB", "04b4:1003", "1209:00ab"}) {
+        ASSERT_EQ(Register({id}), ExitCode::Success) << tool_.Err();
+    }
+    EXPECT_EQ(Rules().substr(Rules().find("SUBSYSTEM")), Rule("1209", "00ab") + Rule("04b4", "1003"));
+    EXPECT_EQ(Register({"1209:0002", "--remove"}), ExitCode::NoInstrument);
+    EXPECT_EQ(Register({"1209:00ab", "--remove"}), ExitCode::Success);
+    EXPECT_EQ(Rules().substr(Rules().find("SUBSYSTEM")), Rule("04b4", "1003"));
+    EXPECT_EQ(Register({"04b4:1003", "--remove"}), ExitCode::Success);
+    EXPECT_FALSE(std::filesystem::exists(file_)) << "a rule file without rules is of no use";
 }
 
 TEST_F(RegisterTest, LeavesOtherRulesAlone) {
     ASSERT_EQ(Register({"1209:0001"}), ExitCode::Success);
     std::string rules = Rules();
     rules.insert(rules.size() - 1, ", SYMLINK+=\"meter\"");
-    const std::string others =
-        "# mine\nSUBSYSTEM==\"tty\", MODE=\"0666\"\n # " + rules.substr(rules.find("SUBSYSTEM"));
+    const std::string others = "# mine\nSUBSYSTEM==\"tty\", MODE=\"0666\"\n # " + Rule("1209", "0001");
     const auto both = rules + others;
     WriteFile(file_, {both.begin(), both.end()});
     EXPECT_EQ(Register({"1209:0001"}), ExitCode::Success);
@@ -66,38 +72,19 @@ TEST_F(RegisterTest, LeavesOtherRulesAlone) {
 }
 
 TEST_F(RegisterTest, KnowsTheRulesOfOlderVersions) {
-    const std::string header =
+    const std::string old =
         "# Written by `ostra register`: these USB devices are measuring instruments.\n"
-        "# The library looks for the property; the tag gives the user at the seat access.\n";
-    const auto rule = [](const char* product, const char* rest) {
-        return "SUBSYSTEM==\"usb\", ENV{DEVTYPE}==\"usb_device\", ATTR{idVendor}==\"1209\", "
-               "ATTR{idProduct}==\"" +
-               std::string(product) + "\", ENV{OSTRA_INTERFACE_CLASS}=\"1\", TAG+=\"uaccess\"" + rest + "\n";
-    };
-    constexpr const char* asNow = ", MODE=\"0660\", GROUP=\"plugdev\"";
-    const std::string two = header + rule("0001", "") + rule("0002", "");
+        "# The library looks for the property; the tag gives the user at the seat access.\n" +
+        Rule("1209", "0001", "\n") + Rule("1209", "0002", "\n");
     std::filesystem::create_directories(std::filesystem::path(file_).parent_path());
-    WriteFile(file_, {two.begin(), two.end()});
+    WriteFile(file_, {old.begin(), old.end()});
     ASSERT_EQ(Register({"1209:0002"}), ExitCode::Success) << tool_.Err();
-    const std::string updated = Rules();
-    EXPECT_EQ(updated.substr(updated.find("SUBSYSTEM")), rule("0001", "") + rule("0002", asNow));
-    EXPECT_NE(updated.find("the group its members"), std::string::npos) << updated;
-
-    const std::string one = header + rule("0001", "");
-    WriteFile(file_, {one.begin(), one.end()});
+    EXPECT_EQ(Rules().substr(Rules().find("SUBSYSTEM")), Rule("1209", "0001", "\n") + Rule("1209", "0002"));
+    EXPECT_NE(Rules().find("the group its members"), std::string::npos) << Rules();
+    WriteFile(file_, {old.begin(), old.end()});
     EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success) << tool_.Err();
+    EXPECT_EQ(Register({"1209:0002", "--remove"}), ExitCode::Success) << tool_.Err();
     EXPECT_FALSE(std::filesystem::exists(file_)) << Rules();
-}
-
-TEST_F(RegisterTest, TakesARegistrationBack) {
-    ASSERT_EQ(Register({"1209:0001"}), ExitCode::Success);
-    ASSERT_EQ(Register({"04b4:1003"}), ExitCode::Success);
-    EXPECT_EQ(Register({"1209:0002", "--remove"}), ExitCode::NoInstrument);
-    EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success);
-    EXPECT_EQ(Rules().find("\"1209\""), std::string::npos) << Rules();
-    EXPECT_NE(Rules().find("\"04b4\""), std::string::npos) << Rules();
-    EXPECT_EQ(Register({"04b4:1003", "--remove"}), ExitCode::Success);
-    EXPECT_FALSE(std::filesystem::exists(file_)) << "a rule file without rules is of no use";
 }
 
 TEST_F(RegisterTest, DryRunsAndMistakesChangeNothing) {

@@ -102,11 +102,6 @@ TEST_P(ScanTest, CsvHasTheNumbersAndTheColumnsThatAreAskedFor) {
         ASSERT_EQ(lines.size(), 8u);
         EXPECT_THAT(lines.front(), testing::MatchesRegex(RegexOf(row.first)));
     }
-    for (const char* column : {"--header", "--number", "--time"}) {
-        Fail({"scan", "--raw", column}, ExitCode::Usage);
-    }
-    Fail({"scan", "--json", "--output", "-"}, ExitCode::Usage);
-    Fail({"scan", "--discard"}, ExitCode::Usage);
 }
 
 TEST_P(ScanTest, OtherRecordSizes) {
@@ -117,7 +112,6 @@ TEST_P(ScanTest, OtherRecordSizes) {
         ASSERT_EQ(std::count(line.begin(), line.end(), ','), 3) << line;
     }
     EXPECT_EQ(ScanRaw({"--record-size", "6553", "--records", "3"}).size(), 3u * 6553);
-    EXPECT_EQ(tool_.Run({"scan", "--record-size", "7"}), ExitCode::Usage) << "no 16-bit values";
 }
 
 TEST_P(ScanTest, ProgressOnATerminalAndASummary) {
@@ -159,12 +153,11 @@ TEST_P(ScanTest, WhatCameIsKept) {
         {"short", "bulk-in 4:short=1000", {}, ExitCode::InputOutput, "short", " of 6400000 bytes came; "},
     };
     for (const Case& row : cases) {
-        for (const char* kind : {"new", "there", "discarded", "open-ended"}) {
-            const std::string how = kind;
+        for (const std::string how : {"there", "discarded", "open-ended"}) {
             if (how == "open-ended" && std::string(row.ended) == "short") {
                 continue;  // it is as long as the instrument makes it
             }
-            SCOPED_TRACE(std::string(row.name) + ", " + kind);
+            SCOPED_TRACE(row.name + (", " + how));
             auto& instrument = host_.Add("sim", Streaming(100'000'000, 100'000));
             SetFaults(row.faults);
             if (how == "there") {
@@ -227,18 +220,16 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
         const Stopwatch watch(clock_);
         const ExitCode code = tool_.Run({"scan", "--raw", "--output", folder_.Path("raw")});
         Platform::ClockScheduler().Forget(event);
-        constexpr std::uint32_t ending = 50;
-        watch.ExpectAtMost(code == ExitCode::Interrupted ? static_cast<std::uint32_t>(after) + ending
-                                                         : 8'000);
-        ASSERT_TRUE(code == ExitCode::Interrupted || code == ExitCode::Success) << tool_.Err();
+        watch.ExpectAtMost(code == ExitCode::Interrupted ? after + 50 : 8'000);
+        EXPECT_TRUE(code == ExitCode::Interrupted || code == ExitCode::Success) << tool_.Err();
         interrupted += code == ExitCode::Interrupted ? 1 : 0;
-        for (const std::string& name : folder_.Files()) {
-            EXPECT_EQ(name, "raw");
-            const auto bytes = ReadFile(folder_.Path(name));
+        if (const auto files = folder_.Files(); !files.empty()) {
+            EXPECT_EQ(files, std::vector<std::string>{"raw"});
+            const auto bytes = ReadFile(folder_.Path("raw"));
             EXPECT_GT(bytes.size(), 0u);
             EXPECT_EQ(bytes.size() % RecordSize, 0u);
             ExpectRecordsInOrder(bytes);
-            std::filesystem::remove(folder_.Path(name));
+            std::filesystem::remove(folder_.Path("raw"));
         }
     }
     EXPECT_GT(interrupted, 20);
@@ -253,17 +244,17 @@ TEST(ScanRecorderTest, RecordsArePutTogetherFromTransfers) {
         data[i] = static_cast<std::uint8_t>(i * i / 7 + i / 251);
     }
     for (const std::uint32_t recordSize : {2u, 8u, 254u, 6552u}) {
-        std::string raw(data.begin(),
-                        data.begin() + static_cast<std::ptrdiff_t>(data.size() / recordSize * recordSize));
+        const std::size_t whole = data.size() / recordSize * recordSize;
+        const std::string raw(data.begin(), data.begin() + static_cast<std::ptrdiff_t>(whole));
         std::string csv;
-        for (std::size_t i = 0; i < raw.size(); i += 2) {
+        for (std::size_t i = 0; i < whole; i += 2) {
             const int value = Protocol::LoadBig16(data.data() + i);
             csv += i % recordSize == 0 ? std::to_string(i / recordSize + 1) + ',' : "";
             csv += std::to_string(value > 0xF800 ? value - 0x10000 : value);
             csv += (i + 2) % recordSize == 0 ? '\n' : ',';
         }
-        for (const bool isRaw : {false, true}) {
-            for (const std::size_t transfer : {1u, 3u, 255u, 256u, 4096u, 100'001u}) {
+        for (const std::size_t transfer : {1u, 255u, 256u, 100'001u}) {
+            for (const bool isRaw : {false, true}) {
                 SCOPED_TRACE(std::to_string(recordSize) + " from " + std::to_string(transfer));
                 std::ostringstream stream;
                 Cli::StreamOutput output(stream);
@@ -276,7 +267,7 @@ TEST(ScanRecorderTest, RecordsArePutTogetherFromTransfers) {
                 }
                 EXPECT_EQ(stream.str(), isRaw ? raw : csv);
                 EXPECT_EQ(output.Records(), data.size() / recordSize);
-                EXPECT_EQ(recorder.LeftOver().size(), data.size() % recordSize);
+                EXPECT_EQ(recorder.LeftOver().size(), data.size() - whole);
                 EXPECT_EQ(recorder.Received(), data.size());
                 EXPECT_GT(told, data.size() - recordSize);
             }
