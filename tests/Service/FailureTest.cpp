@@ -19,46 +19,41 @@ Failure DescribeText(const char* text, Fact... fact) {
 }
 
 TEST(FailureTest, TransfersByTheirCode) {
-    struct Case {
-        std::uint32_t code;
-        FailureKind kind;
-    };
-    for (const Case& row : {
-             Case{2, FailureKind::Unplugged},                // nothing under this name
-             Case{5, FailureKind::NoPermission},             // access denied
-             Case{170, FailureKind::InUse},                  // busy
-             Case{31, FailureKind::TransferFailed},          // broken
-             Case{996, FailureKind::Timeout},                // still running
-             Case{1166, FailureKind::TransferFailed},        // not the code of the next row
-             Case{1167, FailureKind::Unplugged},             // gone
-             Case{0xE0001021, FailureKind::InUse},           // opened by another process
-             Case{0xE000100C, FailureKind::Timeout},         // timed out
-             Case{0xE000100A, FailureKind::Unplugged},       // removed
-             Case{0xE0000030, FailureKind::TransferFailed},  // halted
+    for (const auto& [code, kind] : std::vector<std::pair<std::uint32_t, FailureKind>>{
+             {2, FailureKind::Unplugged},                // nothing under this name
+             {5, FailureKind::NoPermission},             // access denied
+             {170, FailureKind::InUse},                  // busy
+             {31, FailureKind::TransferFailed},          // broken
+             {996, FailureKind::Timeout},                // still running
+             {1166, FailureKind::TransferFailed},        // not the code of the next row
+             {1167, FailureKind::Unplugged},             // gone
+             {0xE0001021, FailureKind::InUse},           // opened by another process
+             {0xE000100C, FailureKind::Timeout},         // timed out
+             {0xE000100A, FailureKind::Unplugged},       // removed
+             {0xE0000030, FailureKind::TransferFailed},  // halted
          }) {
         // What a text says is for people; it decides nothing.
         const char* const text = "read data failed (Win32 Error (1167) : gone)";
-        const Failure report = DescribeText<IOException>(text, row.code);
-        EXPECT_EQ(report.Kind(), row.kind) << row.code;
+        const Failure report = DescribeText<IOException>(text, code);
+        EXPECT_EQ(report.Kind(), kind) << code;
         EXPECT_NE(report.Message().find(text), std::string::npos) << report.Message();
-        EXPECT_FALSE(report.Advice().empty()) << row.code;
-        const FailureKind late = row.kind == FailureKind::TransferFailed ? FailureKind::Timeout : row.kind;
-        EXPECT_EQ(DescribeText<TimeoutException>(text, row.code).Kind(), late) << row.code;
+        EXPECT_FALSE(report.Advice().empty()) << code;
+        const FailureKind late = kind == FailureKind::TransferFailed ? FailureKind::Timeout : kind;
+        EXPECT_EQ(DescribeText<TimeoutException>(text, code).Kind(), late) << code;
     }
     EXPECT_EQ(DescribeText<IOException>("gone (Win32 Error (1167) : gone)").Kind(),
               FailureKind::TransferFailed);
 }
 
-TEST(FailureTest, DataThatCameShortAreCounted) {
+TEST(FailureTest, OtherClasses) {
     const Failure report = DescribeText<IOException>("read data failed", Shortfall{60, 256});
     EXPECT_EQ(report.Kind(), FailureKind::ShortData);
     EXPECT_EQ(report.Message(), "60 of 256 bytes came (read data failed)");
     EXPECT_EQ(DescribeText<IOException>("0 of 8 bytes came", Shortfall{0, 8}).Message(), "0 of 8 bytes came");
-}
-
-TEST(FailureTest, OtherClasses) {
     EXPECT_EQ(DescribeText<TimeoutException>("x").Kind(), FailureKind::Timeout);
-    EXPECT_EQ(DescribeText<DataException>("corrupt EAT detected!!").Kind(), FailureKind::BadData);
+    EXPECT_EQ(DescribeText<DataException>("x").Kind(), FailureKind::BadData);
+    EXPECT_EQ(DescribeText<DataException>("a\r\nb").Message(), "ab")
+        << "a system's text ends with a line break";
     EXPECT_EQ(DescribeText<Varnholt::Utilities::Exceptions::ResourceException>("x").Kind(),
               FailureKind::Other);
     EXPECT_EQ(Describe(std::make_exception_ptr(std::bad_alloc())).Message(), "not enough memory");
@@ -67,9 +62,7 @@ TEST(FailureTest, OtherClasses) {
         Describe(std::make_exception_ptr(Varnholt::Utilities::Files::FileError("what", "way out")));
     EXPECT_EQ(ofFile.Kind(), FailureKind::File);
     EXPECT_EQ(ofFile.Advice(), "way out");
-}
 
-TEST(FailureTest, IsChangedWithoutLosingTheRest) {
     const Failure failure = Failure(FailureKind::Timeout, "late", "wait", "driver's text").Of("usbio/a");
     EXPECT_STREQ(failure.what(), "usbio/a: late");
     const Failure changed =
@@ -80,10 +73,6 @@ TEST(FailureTest, IsChangedWithoutLosingTheRest) {
     EXPECT_EQ(changed.Kind(), FailureKind::Timeout);
     EXPECT_EQ(changed.Instrument(), "usbio/a");
     EXPECT_EQ(changed.DriverText(), "driver's text");
-}
-
-TEST(FailureTest, ASystemTextLosesItsLineBreak) {
-    EXPECT_EQ(DescribeText<DataException>("a\r\nb").Message(), "ab");
 }
 
 TEST(InstrumentNamesTest, ShortNames) {
