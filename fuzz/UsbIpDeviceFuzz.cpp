@@ -1,4 +1,4 @@
-// The USB/IP client: any bytes from the peer that it is connected to.
+// The USB/IP client: any bytes from the peer that it is connected to, and any descriptors from a device.
 #include <sys/socket.h>
 #include <unistd.h>
 
@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <cstdlib>
 
+#include "Platform/Usb/UsbDescriptors.h"
 #include "Platform/Usb/UsbIpDevice.h"
 #include "Protocol/Instrument.h"
 
@@ -36,6 +37,10 @@ class CountedTransfer final : public Transfer, private TransferClient {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* input, std::size_t size) {
+    constexpr std::size_t shortestEndpoint = 6;
+    if (EndpointsOfFirstInterface({input, size}).size() > size / shortestEndpoint) {
+        std::abort();
+    }
     constexpr std::size_t most = 16384;  // stays in the socket: nobody reads on while it is written
     std::array<int, 2> ends{-1, -1};
     if (size > most || socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends.data()) != 0) {

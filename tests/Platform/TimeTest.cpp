@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include <array>
 #include <chrono>
 #include <ctime>
 
@@ -34,24 +35,17 @@ TEST_P(Clocks, AgreeOnASleep) {
     EXPECT_LT(wallAfter.milliseconds, 1000);
 }
 
-TEST(Calendar, IsLocalTime) {
-    for (const std::int64_t seconds : {std::int64_t{0x7FFFFFFF}, std::int64_t{1'000'000'000},
-                                       std::int64_t{951'782'400}, std::int64_t{1'709'210'096}}) {
-        const auto time = static_cast<std::time_t>(seconds);
-        const std::tm* const expected = std::localtime(&time);
+TEST(WallClock, AndItsCalendarAreTheSystems) {
+    const auto now = std::chrono::system_clock::to_time_t(std::chrono::system_clock::now());
+    EXPECT_NEAR(static_cast<double>(WallClockNow().seconds), static_cast<double>(now), 2);
+    for (const std::time_t seconds : {std::time_t{0x7FFFFFFF}, std::time_t{951'782'400}, now}) {
+        const std::tm* const expected = std::localtime(&seconds);
         const CalendarTime actual = LocalCalendarTime(seconds);
-        EXPECT_EQ(actual.year, expected->tm_year + 1900);
-        EXPECT_EQ(actual.month, expected->tm_mon + 1);
-        EXPECT_EQ(actual.day, expected->tm_mday);
-        EXPECT_EQ(actual.hour, expected->tm_hour);
-        EXPECT_EQ(actual.minute, expected->tm_min);
-        EXPECT_EQ(actual.second, expected->tm_sec);
+        EXPECT_EQ(
+            (std::array{actual.year, actual.month, actual.day, actual.hour, actual.minute, actual.second}),
+            (std::array{expected->tm_year + 1900, expected->tm_mon + 1, expected->tm_mday, expected->tm_hour,
+                        expected->tm_min, expected->tm_sec}));
     }
-}
-
-TEST(WallClock, IsTheSystems) {
-    const auto expected = std::chrono::system_clock::to_time_t(std::chrono::system_clock::now());
-    EXPECT_NEAR(static_cast<double>(WallClockNow().seconds), static_cast<double>(expected), 2);
 }
 
 }  // namespace

@@ -20,35 +20,18 @@ namespace {
 /// Long enough for threads that said what they do next to have done it.
 constexpr std::uint32_t SettlingTime = 40;
 
-std::uint32_t MillisecondsSince(std::uint32_t start) {
-    return TickCount() - start;
-}
-
 std::string NameFor(const char* purpose) {
     return UniqueName(std::string("{") + purpose + "}#");
 }
 
-using Events = EachClock;
 using Waits = EachClock;
 using Mutexes = EachClock;
 using Semaphores = EachClock;
 using SignalAndWaits = EachClock;
-using RecursiveMutexes = EachClock;
-INSTANTIATE_FOR_EACH_CLOCK(Events);
 INSTANTIATE_FOR_EACH_CLOCK(Waits);
 INSTANTIATE_FOR_EACH_CLOCK(Mutexes);
 INSTANTIATE_FOR_EACH_CLOCK(Semaphores);
 INSTANTIATE_FOR_EACH_CLOCK(SignalAndWaits);
-INSTANTIATE_FOR_EACH_CLOCK(RecursiveMutexes);
-
-TEST_P(Events, KeepOneSignalForOneWait) {
-    const OwnedHandle event(MakeAutoResetEvent());
-    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
-    EXPECT_TRUE(SignalEvent(event.Get()));
-    EXPECT_TRUE(SignalEvent(event.Get()));
-    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::Signalled);
-    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
-}
 
 /// Ends the threads that wait for an object by as many `signals`, and expects that it had no more.
 void ExpectOneWaitPerSignal(Handle object, int threadCount, const std::function<void()>& signals) {
@@ -90,8 +73,13 @@ void ExpectExclusion(Enter enter, Leave leave) {
     EXPECT_EQ(counter, 900);
 }
 
-TEST_P(Events, SignalsInARowEndAsManyWaits) {
+TEST_P(Waits, TakeOneSignalOfAnEvent) {
     const OwnedHandle event(MakeAutoResetEvent());
+    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
+    EXPECT_TRUE(SignalEvent(event.Get()));
+    EXPECT_TRUE(SignalEvent(event.Get()));
+    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::Signalled);
+    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
     ExpectOneWaitPerSignal(event.Get(), 4, [&] {
         for (int i = 0; i < 4; ++i) {
             EXPECT_TRUE(SignalEvent(event.Get()));
@@ -104,82 +92,54 @@ TEST_P(Waits, LastAsLongAsTheirTimeout) {
     const std::uint32_t start = TickCount();
     EXPECT_EQ(Wait(event.Get(), 60), WaitResult::TimedOut);
     EXPECT_EQ(WaitAny(std::array{event.Get()}, 40).result, WaitResult::TimedOut);
-    EXPECT_GE(MillisecondsSince(start), 90u);  // a tick may be 10 ms long
-    EXPECT_LT(MillisecondsSince(start), 5000u);
+    EXPECT_GE(TickCount() - start, 90u);  // a tick may be 10 ms long
+    EXPECT_LT(TickCount() - start, 5000u);
 }
 
-TEST_P(Waits, RefuseWhatIsNoHandle) {
+TEST_P(Waits, RefuseWhatIsNoHandleOrNamesAnotherKindOfObject) {
     OwnedHandle closed(MakeAutoResetEvent());
     const OwnedHandle event(MakeAutoResetEvent());
+    const OwnedHandle mutex(MakeMutex(""));
     const Handle gone = closed.Get();
     closed.Reset();
+    const auto expectInvalid = [](bool isFailure) {
+        EXPECT_TRUE(isFailure);
+        EXPECT_EQ(LastError(), Errors::InvalidHandle);
+        SetLastError(Errors::Success);
+    };
     for (const Handle handle : {NoHandle, InvalidHandle(), gone}) {
-        const auto refused = [](bool isFailure) {
-            EXPECT_TRUE(isFailure);
-            EXPECT_EQ(LastError(), Errors::InvalidHandle);
-            SetLastError(Errors::Success);
-        };
-        refused(Wait(handle, 0) == WaitResult::Failed);
-        refused(WaitAny(std::array{event.Get(), handle}, 0).result == WaitResult::Failed);
-        refused(SignalAndWait(event.Get(), handle, 0) == WaitResult::Failed);
-        refused(SignalAndWait(handle, event.Get(), 0) == WaitResult::Failed);
-        refused(!SignalEvent(handle));
-        refused(!ReleaseMutex(handle));
-        refused(!ReleaseSemaphore(handle, 1));
+        expectInvalid(Wait(handle, 0) == WaitResult::Failed);
+        expectInvalid(WaitAny(std::array{event.Get(), handle}, 0).result == WaitResult::Failed);
+        expectInvalid(SignalAndWait(event.Get(), handle, 0) == WaitResult::Failed);
+        expectInvalid(SignalAndWait(handle, event.Get(), 0) == WaitResult::Failed);
+        expectInvalid(!SignalEvent(handle));
+        expectInvalid(!ReleaseMutex(handle));
+        expectInvalid(!ReleaseSemaphore(handle, 1));
     }
-}
-
-TEST_P(Waits, RefuseAnotherKindOfObject) {
-    const OwnedHandle event(MakeAutoResetEvent());
-    const OwnedHandle mutex(MakeMutex(""));
-    EXPECT_FALSE(SignalEvent(mutex.Get()));
-    EXPECT_EQ(LastError(), Errors::InvalidHandle);
-    EXPECT_FALSE(ReleaseMutex(event.Get()));
-    EXPECT_EQ(LastError(), Errors::InvalidHandle);
-    EXPECT_FALSE(ReleaseSemaphore(event.Get(), 1));
-    EXPECT_EQ(LastError(), Errors::InvalidHandle);
+    expectInvalid(!SignalEvent(mutex.Get()));
+    expectInvalid(!ReleaseMutex(event.Get()));
+    expectInvalid(!ReleaseSemaphore(event.Get(), 1));
     EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
 }
 
-TEST_P(Waits, TakeOnlyTheFirstObjectThatCanBeTaken) {
-    const OwnedHandle event(MakeAutoResetEvent());
+TEST_P(Waits, TakeOnlyTheFirstOfAtMostSixtyFourObjects) {
     const OwnedHandle semaphore(MakeSemaphore(1, 1, ""));
     const OwnedHandle mutex(MakeMutex(""));
-    const std::array objects{event.Get(), semaphore.Get(), mutex.Get()};
-    for (const std::size_t expected : {std::size_t{1}, std::size_t{2}}) {
+    std::vector<OwnedHandle> events;
+    std::vector<Handle> objects;
+    for (int i = 0; i < 62; ++i) {
+        objects.push_back(events.emplace_back(MakeAutoResetEvent()).Get());
+    }
+    objects.insert(objects.end(), {semaphore.Get(), mutex.Get()});
+    for (const std::size_t expected : {62U, 63U}) {
         const WaitAnyResult outcome = WaitAny(objects, 0);
         EXPECT_EQ(outcome.result, WaitResult::Signalled);
         EXPECT_EQ(outcome.index, expected);
     }
-    SignalEvent(event.Get());
+    SignalEvent(objects[0]);
     ReleaseSemaphore(semaphore.Get(), 1);
     EXPECT_EQ(WaitAny(objects, 0).index, 0u);
     EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
-}
-
-TEST_P(Waits, EndWithWhicheverObjectComesFirst) {
-    const OwnedHandle first(MakeAutoResetEvent());
-    const OwnedHandle second(MakeAutoResetEvent());
-    WaitAnyResult outcome{};
-    TestThread waiting([&] { outcome = WaitAny(std::array{first.Get(), second.Get()}, LongTimeout); });
-    SleepMilliseconds(SettlingTime);
-    SignalEvent(second.Get());
-    SignalEvent(first.Get());
-    waiting.Join();
-    EXPECT_EQ(outcome.result, WaitResult::Signalled);
-    EXPECT_EQ(outcome.index, 1u);
-    EXPECT_EQ(Wait(first.Get(), 0), WaitResult::Signalled) << "a wait that had ended took another signal";
-}
-
-TEST_P(Waits, AreForOneToSixtyFourObjects) {
-    const OwnedHandle semaphore(MakeSemaphore(1, 1, ""));
-    std::vector<OwnedHandle> events;
-    std::vector<Handle> objects;
-    for (int i = 0; i < 63; ++i) {
-        objects.push_back(events.emplace_back(MakeAutoResetEvent()).Get());
-    }
-    objects.push_back(semaphore.Get());
-    EXPECT_EQ(WaitAny(objects, 0).index, 63u);
     objects.push_back(events.emplace_back(MakeAutoResetEvent()).Get());
     for (const auto& refused : {std::vector<Handle>{}, objects}) {
         SetLastError(Errors::Success);
@@ -188,16 +148,23 @@ TEST_P(Waits, AreForOneToSixtyFourObjects) {
     }
 }
 
-TEST_P(Waits, GoOnWhenTheirHandleIsClosed) {
-    OwnedHandle event(MakeAutoResetEvent());
-    const OwnedHandle other(MakeAutoResetEvent());
-    TestThread waiting([handle = event.Get(), &other] {
-        EXPECT_EQ(WaitAny(std::array{handle, other.Get()}, LongTimeout).result, WaitResult::Signalled);
+TEST_P(Waits, EndWithWhicheverObjectComesFirstAndOutlastAClosedHandle) {
+    const OwnedHandle first(MakeAutoResetEvent());
+    const OwnedHandle second(MakeAutoResetEvent());
+    OwnedHandle third(MakeAutoResetEvent());
+    WaitAnyResult outcome{};
+    TestThread waiting([&, closed = third.Get()] {
+        outcome = WaitAny(std::array{first.Get(), second.Get(), closed}, LongTimeout);
     });
     SleepMilliseconds(SettlingTime);
-    event.Reset();
+    third.Reset();
     SleepMilliseconds(1);
-    SignalEvent(other.Get());
+    SignalEvent(second.Get());
+    SignalEvent(first.Get());
+    waiting.Join();
+    EXPECT_EQ(outcome.result, WaitResult::Signalled);
+    EXPECT_EQ(outcome.index, 1u);
+    EXPECT_EQ(Wait(first.Get(), 0), WaitResult::Signalled) << "a wait that had ended took another signal";
 }
 
 TEST_P(Mutexes, AreRecursiveAndBelongToAThread) {
@@ -212,67 +179,67 @@ TEST_P(Mutexes, AreRecursiveAndBelongToAThread) {
             EXPECT_EQ(LastError(), Errors::NotOwner);
         }).Join();
         EXPECT_TRUE(ReleaseMutex(mutex.Get()));
-        TestThread([&] {
-            EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
-            EXPECT_TRUE(ReleaseMutex(mutex.Get()));
-        }).Join();
         EXPECT_FALSE(ReleaseMutex(mutex.Get()));
         EXPECT_EQ(LastError(), Errors::NotOwner);
+        ExpectExclusion([&] { EXPECT_EQ(Wait(mutex.Get(), LongTimeout), WaitResult::Signalled); },
+                        [&] { EXPECT_TRUE(ReleaseMutex(mutex.Get())); });
     }
 }
 
 TEST_P(Mutexes, AreOneForTheSameName) {
     const OwnedHandle first(MakeMutex(NameFor("same")));
     const OwnedHandle second(MakeMutex(NameFor("same")));
-    const OwnedHandle other(MakeMutex(NameFor("other")));
-    const OwnedHandle otherCase(MakeMutex(NameFor("Same")));
     EXPECT_EQ(Wait(first.Get(), 0), WaitResult::Signalled);
     TestThread([&] {
         EXPECT_EQ(Wait(second.Get(), 0), WaitResult::TimedOut);
-        EXPECT_EQ(Wait(other.Get(), 0), WaitResult::Signalled);
-        EXPECT_TRUE(ReleaseMutex(other.Get()));
-        EXPECT_EQ(Wait(otherCase.Get(), 0), WaitResult::Signalled);
-        EXPECT_TRUE(ReleaseMutex(otherCase.Get()));
+        for (const char* other : {"other", "Same"}) {
+            const OwnedHandle mutex(MakeMutex(NameFor(other)));
+            EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled) << other;
+        }
     }).Join();
     EXPECT_TRUE(ReleaseMutex(second.Get())) << "two handles of one thread are one mutex";
 }
 
+/// To a thread that waits already, and to one that comes later.
 TEST_P(Mutexes, TellTheNextOwnerWhenTheLastOneEnded) {
     for (const std::string& name : {std::string(), NameFor("abandoned")}) {
         const OwnedHandle mutex(MakeMutex(name));
-        const OwnedHandle never(MakeAutoResetEvent());
-        TestThread([&] { Wait(mutex.Get(), 0); }).Join();
-        const WaitAnyResult outcome = WaitAny(std::array{never.Get(), mutex.Get()}, LongTimeout);
-        EXPECT_EQ(outcome.result, WaitResult::Abandoned);
-        EXPECT_EQ(outcome.index, 1u);
-        EXPECT_TRUE(ReleaseMutex(mutex.Get())) << "an abandoned mutex has been acquired";
-        EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled) << "it is told once";
-        EXPECT_TRUE(ReleaseMutex(mutex.Get()));
-    }
-}
-
-TEST_P(Mutexes, AreHandedOnWhenTheirOwnerEnds) {
-    for (const std::string& name : {std::string(), NameFor("handed on")}) {
-        const OwnedHandle mutex(MakeMutex(name));
         const OwnedHandle owned(MakeAutoResetEvent());
-        TestThread owner([&] {
-            Wait(mutex.Get(), 0);
-            Wait(mutex.Get(), 0);
-            SignalEvent(owned.Get());
-            SleepMilliseconds(SettlingTime);
-        });
-        EXPECT_EQ(Wait(owned.Get(), LongTimeout), WaitResult::Signalled);
-        EXPECT_EQ(Wait(mutex.Get(), LongTimeout), WaitResult::Abandoned);
-        EXPECT_TRUE(ReleaseMutex(mutex.Get()));
+        for (const std::uint32_t lasts : {SettlingTime, 0U}) {
+            TestThread owner([&] {
+                Wait(mutex.Get(), 0);
+                Wait(mutex.Get(), 0);
+                SignalEvent(owned.Get());
+                SleepMilliseconds(lasts);
+            });
+            EXPECT_EQ(Wait(owned.Get(), LongTimeout), WaitResult::Signalled);
+            if (lasts == 0) {
+                owner.Join();
+            }
+            const WaitAnyResult outcome = WaitAny(std::array{owned.Get(), mutex.Get()}, LongTimeout);
+            EXPECT_EQ(outcome.result, WaitResult::Abandoned);
+            EXPECT_EQ(outcome.index, 1u);
+            EXPECT_TRUE(ReleaseMutex(mutex.Get())) << "an abandoned mutex has been acquired";
+            EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled) << "it is told once";
+            EXPECT_TRUE(ReleaseMutex(mutex.Get()));
+        }
     }
 }
 
-TEST_P(Mutexes, ExcludeThreads) {
-    for (const std::string& name : {std::string(), NameFor("exclusion")}) {
-        const OwnedHandle mutex(MakeMutex(name));
-        ExpectExclusion([&] { EXPECT_EQ(Wait(mutex.Get(), LongTimeout), WaitResult::Signalled); },
-                        [&] { EXPECT_TRUE(ReleaseMutex(mutex.Get())); });
-    }
+TEST_P(Mutexes, WithoutAHandleHoldOthersUpUntilTheLastUnlock) {
+    RecursiveMutex mutex;
+    ExpectExclusion([&] { mutex.lock(); }, [&] { mutex.unlock(); });
+    std::atomic<bool> entered = false;
+    mutex.lock();
+    mutex.lock();
+    TestThread other([&] {
+        const std::lock_guard holder(mutex);
+        entered = true;
+    });
+    mutex.unlock();
+    SleepMilliseconds(SettlingTime);
+    EXPECT_FALSE(entered);
+    mutex.unlock();
 }
 
 TEST_P(Semaphores, CountUpToTheirMaximum) {
@@ -291,27 +258,15 @@ TEST_P(Semaphores, CountUpToTheirMaximum) {
         EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
         EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
         EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::TimedOut);
+        ExpectOneWaitPerSignal(semaphore.Get(), 3, [&] {
+            EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 2));
+            SleepMilliseconds(SettlingTime);
+            EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 1));
+        });
     }
-}
-
-TEST_P(Semaphores, LetAsManyThreadsPassAsAreReleased) {
-    const OwnedHandle semaphore(MakeSemaphore(0, 0x7FFFFFFF, ""));
-    ExpectOneWaitPerSignal(semaphore.Get(), 3, [&] {
-        EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 2));
-        SleepMilliseconds(SettlingTime);
-        EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 1));
-    });
-}
-
-TEST_P(Semaphores, RefuseImpossibleCounts) {
-    struct {
-        std::int32_t initial;
-        std::int32_t maximum;
-    } const cases[] = {{-1, 1}, {0, 0}, {0, -1}, {2, 1}};
-    for (const auto& counts : cases) {
+    for (const auto& [initial, maximum] : {std::pair(-1, 1), {0, 0}, {0, -1}, {2, 1}}) {
         SetLastError(Errors::Success);
-        EXPECT_EQ(MakeSemaphore(counts.initial, counts.maximum, ""), NoHandle)
-            << counts.initial << " of " << counts.maximum;
+        EXPECT_EQ(MakeSemaphore(initial, maximum, ""), NoHandle) << initial << " of " << maximum;
         EXPECT_EQ(LastError(), Errors::InvalidParameter);
     }
 }
@@ -336,18 +291,14 @@ TEST_P(SignalAndWaits, WaitForNothingWhenTheyCannotSignal) {
     const OwnedHandle event(MakeAutoResetEvent());
     const OwnedHandle mutex(MakeMutex(""));
     const OwnedHandle full(MakeSemaphore(1, 1, ""));
-    TestThread thread([] {});
+    const TestThread thread([] {});
     SignalEvent(event.Get());
-    struct {
-        Handle toSignal;
-        ErrorCode code;
-    } const cases[] = {{mutex.Get(), Errors::NotOwner},
-                       {full.Get(), Errors::TooManyPosts},
-                       {thread.Get(), Errors::InvalidHandle}};
-    for (const auto& failing : cases) {
+    for (const auto& [toSignal, code] : {std::pair(mutex.Get(), Errors::NotOwner),
+                                         {full.Get(), Errors::TooManyPosts},
+                                         {thread.Get(), Errors::InvalidHandle}}) {
         SetLastError(Errors::Success);
-        EXPECT_EQ(SignalAndWait(failing.toSignal, event.Get(), LongTimeout), WaitResult::Failed);
-        EXPECT_EQ(LastError(), failing.code);
+        EXPECT_EQ(SignalAndWait(toSignal, event.Get(), LongTimeout), WaitResult::Failed);
+        EXPECT_EQ(LastError(), code);
     }
     EXPECT_EQ(Wait(event.Get(), 0), WaitResult::Signalled) << "the wait took the signal all the same";
 }
@@ -367,28 +318,6 @@ TEST_P(SignalAndWaits, LoseNoSignal) {
         ASSERT_EQ(SignalAndWait(second.Get(), first.Get(), LongTimeout), WaitResult::Signalled);
     }
     SignalEvent(second.Get());
-}
-
-TEST_P(RecursiveMutexes, ExcludeThreads) {
-    RecursiveMutex mutex;
-    ExpectExclusion([&] { mutex.lock(); }, [&] { mutex.unlock(); });
-}
-
-TEST_P(RecursiveMutexes, HoldOthersUpUntilTheLastUnlock) {
-    RecursiveMutex mutex;
-    std::atomic<bool> entered = false;
-    mutex.lock();
-    mutex.lock();
-    TestThread other([&] {
-        const std::lock_guard holder(mutex);
-        entered = true;
-    });
-    mutex.unlock();
-    SleepMilliseconds(SettlingTime);
-    EXPECT_FALSE(entered);
-    mutex.unlock();
-    other.Join();
-    EXPECT_TRUE(entered);
 }
 
 std::uint32_t Nothing(void*) {

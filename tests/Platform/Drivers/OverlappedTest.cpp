@@ -183,15 +183,25 @@ TEST_F(OverlappedFiles, RefuseHandlesThatNameNothing) {
     EXPECT_EQ(Platform::Wait(reopened, 0), WaitResult::Failed);
 }
 
-// A failure put into the question for the result must not pass for the end of the transfer.
-TEST_F(OverlappedFiles, AFailingQuestionDoesNotReleaseTheBuffer) {
+// A failure put into the question for the result must not pass for the end of the transfer, nor one of the
+// signal keep anybody waiting.
+TEST_F(OverlappedFiles, FailuresPutInNeitherReleaseTheBufferNorKeepTheSignal) {
     StartPending(pipe_, buffer_, request_);
     Platform::InstallCallFilter(
         [](std::string_view call) { return call == "GetResult" ? Errors::GeneralFailure : Errors::Success; });
     EXPECT_EQ(Result(pipe_, request_).code, Errors::IoIncomplete);
     device_->Send(In, {1, 2, 3});
     EXPECT_EQ(Result(pipe_, request_, true), (Outcome{Errors::GeneralFailure, 3}));
+
+    int signals = 0;
+    Platform::InstallCallFilter([&signals](std::string_view call) {
+        return call == "SignalEvent" && ++signals == 1 ? Errors::GeneralFailure : Errors::Success;
+    });
+    StartPending(pipe_, buffer_, request_);
+    EXPECT_EQ(request_.record.internalHigh, 0u) << "nothing has moved yet";
+    device_->Send(In, {1});
     Platform::InstallCallFilter({});
+    EXPECT_TRUE(request_.TakeSignal());
 }
 
 // As they do for a host that forgets to close them.

@@ -5,6 +5,7 @@
 #include <memory>
 #include <thread>
 
+#include "Platform/EventScheduler.h"
 #include "Platform/Threads.h"
 #include "Platform/Usb/LibUsbEvents.h"
 #include "Platform/WaitableObjects.h"
@@ -79,13 +80,28 @@ TEST_F(LibUsbEventsTest, AWaitEndsInTimeAndOutlastsTheEvents) {
 }
 
 /// An aborted transfer, or the button's, may end when nobody waits.
-TEST_F(LibUsbEventsTest, AfterALongWaitTheirOwnThreadHandlesThemAgain) {
+TEST_F(LibUsbEventsTest, OneThreadHandlesThemAndTheirOwnWhereNobodyWaits) {
+    const auto isHandled = [this] {
+        const auto patienceEnds = std::chrono::steady_clock::now() + std::chrono::milliseconds(LongTimeout);
+        while (libusb_event_handler_active(context_) == 0 &&
+               std::chrono::steady_clock::now() < patienceEnds) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(1));
+        }
+        return libusb_event_handler_active(context_) != 0;
+    };
     EXPECT_EQ(Wait(back_.Get(), 50), WaitResult::TimedOut);
-    const auto patienceEnds = std::chrono::steady_clock::now() + std::chrono::milliseconds(LongTimeout);
-    while (libusb_event_handler_active(context_) == 0 && std::chrono::steady_clock::now() < patienceEnds) {
-        std::this_thread::sleep_for(std::chrono::milliseconds(1));
+    EXPECT_TRUE(isHandled());
+    for (int i = 0; i < 2; ++i) {
+        EXPECT_TRUE(events_->TryBegin());
+        EXPECT_FALSE(events_->TryBegin()) << "another waits with them";
+        events_->HandleEvents(ClockScheduler().Now());
     }
-    EXPECT_NE(libusb_event_handler_active(context_), 0);
+    events_->HandleAlways();
+    EXPECT_FALSE(events_->TryBegin());
+    EXPECT_TRUE(isHandled());
+    events_->Stop();
+    EXPECT_FALSE(events_->TryBegin());
+    EXPECT_EQ(libusb_event_handler_active(context_), 0);
 }
 
 }  // namespace

@@ -8,7 +8,6 @@
 #include <chrono>
 #include <cstring>
 #include <filesystem>
-#include <functional>
 #include <iterator>
 #include <optional>
 #include <string>
@@ -126,13 +125,13 @@ TEST_F(UsbIpDeviceTest, ImportAndPacketsAreWhatTheProtocolSays) {
     ASSERT_EQ(Errors::Success, device->Submit(readout));
 
     const auto first = PeerReceivesPacket<UsbIp::SubmitPacket>();
-    EXPECT_EQ((SetupPacket{0x40, 0xCA, 0, 0, 1}), first.setup);
-    EXPECT_EQ(0x00030004U, first.deviceId);
-    EXPECT_EQ(1U, first.length);
+    EXPECT_EQ((UsbIp::SubmitPacket{first.sequence, 0x00030004, 0, 1, 0, {0x40, 0xCA, 0, 0, 1}, false}),
+              first);
     EXPECT_EQ(Bytes{31}, PeerReceives(1));
     const auto second = PeerReceivesPacket<UsbIp::SubmitPacket>();
-    EXPECT_EQ(BulkInEndpoint, second.endpoint);
-    EXPECT_EQ(256U, second.length);
+    EXPECT_EQ(
+        (UsbIp::SubmitPacket{second.sequence, 0x00030004, BulkInEndpoint, 256, second.interval, {}, true}),
+        second);
     EXPECT_NE(first.sequence, second.sequence);
 
     // Answered in the other order.
@@ -192,47 +191,42 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
 TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
     struct Case {
         const char* name;
-        std::function<Bytes(const UsbIp::SubmitPacket&)> sends;
+        std::uint32_t sequence;   ///< of the answer, from that of the submission on
+        std::uint32_t announced;  ///< bytes
+        std::size_t sent;         ///< bytes, with the header
         bool leaves = false;
     };
-    /// An answer that announces some bytes and brings others.
-    const auto reply = [](std::uint32_t sequence, std::uint32_t announced, std::size_t bytes = 0) {
-        return Bytes() + UsbIp::Encode(UsbIp::SubmitReply{sequence, 0, announced}) + Bytes(bytes);
-    };
     for (const Case& test : {
-             Case{"leaves", [](auto&) { return Bytes(); }, true},
-             Case{"leaves amid the data", [&](auto& submit) { return reply(submit.sequence, 64, 32); }, true},
-             Case{"answers what was not asked",
-                  [&](auto& submit) { return reply(submit.sequence + 100, 0); }},
-             Case{"answers a cancellation that there was not",
-                  [](auto& submit) {
-                      return Bytes() + UsbIp::Encode(UsbIp::UnlinkReply{submit.sequence + 100, 0});
-                  }},
-             Case{"sends too much", [&](auto& submit) { return reply(submit.sequence, 65, 65); }},
-             Case{"announces 4 GB", [&](auto& submit) { return reply(submit.sequence, 0xFFFFFFFF); }},
-             Case{"submits to a host", [](auto& submit) { return Bytes() + UsbIp::Encode(submit); }},
-             Case{"sends garbage", [](auto&) { return Bytes(48, 0x5A); }},
-             Case{"stops in the middle of a header", [](auto&) { return Bytes(20); }},
-             Case{"stops amid the data", [&](auto& submit) { return reply(submit.sequence, 64, 32); }},
+             Case{"leaves", 0, 64, 0, true},
+             Case{"leaves amid the data", 0, 64, 48 + 32, true},
+             Case{"stops amid the data", 0, 64, 48 + 32},
+             Case{"stops in the middle of a header", 0, 64, 20},
+             Case{"answers what was not asked", 100, 0, 48},
+             Case{"sends too much", 0, 65, 48 + 65},
+             Case{"announces 4 GB", 0, 0xFFFFFFFF, 48},
          }) {
+        SCOPED_TRACE(test.name);
         const auto device = MakeClaimedDevice();
         TestTransfer first = TestTransfer::In(BulkInEndpoint, 64);
         TestTransfer second = TestTransfer::Out(BulkOutEndpoint, Bytes(64));
         ASSERT_EQ(Errors::Success, device->Submit(first));
         ASSERT_EQ(Errors::Success, device->Submit(second));
-        PeerSends(test.sends(PeerReceivesPacket<UsbIp::SubmitPacket>()));
+        const std::uint32_t sequence = PeerReceivesPacket<UsbIp::SubmitPacket>().sequence + test.sequence;
+        Bytes reply = Bytes() + UsbIp::Encode(UsbIp::SubmitReply{sequence, 0, test.announced});
+        reply.resize(test.sent);
+        PeerSends(reply);
         if (test.leaves) {
             ClosePeer();
         }
-        ASSERT_TRUE(first.Wait()) << test.name;
-        ASSERT_TRUE(second.Wait()) << test.name;
-        EXPECT_EQ(TransferStatus::DeviceGone, first.status) << test.name;
-        EXPECT_EQ(TransferStatus::DeviceGone, second.status) << test.name;
+        for (TestTransfer* const each : {&first, &second}) {
+            ASSERT_TRUE(each->Wait());
+            EXPECT_EQ(TransferStatus::DeviceGone, each->status);
+        }
         TestTransfer after = TestTransfer::In(BulkInEndpoint, 64);
-        EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(after)) << test.name;
-        EXPECT_EQ(Errors::DeviceNotConnected, device->Claim()) << test.name;
+        EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(after));
+        EXPECT_EQ(Errors::DeviceNotConnected, device->Claim());
         device->Release();
-        EXPECT_EQ(Errors::Success, device->Claim()) << test.name << ": a new connection";
+        EXPECT_EQ(Errors::Success, device->Claim()) << "a new connection";
     }
 }
 
@@ -265,31 +259,23 @@ TEST_F(UsbIpDeviceTest, PeerThatDoesNotReadDoesNotHoldUpASubmission) {
 }
 
 TEST_F(UsbIpDeviceTest, ImportFailuresAreToldApart) {
-    struct Case {
-        const char* name;
-        Bytes reply;
-        ErrorCode expected;
-    };
     Bytes otherOperation = ImportReply();
     otherOperation[3] = 0x05;
     Bytes half = ImportReply();
     half.resize(100);
-    for (const Case& test : {
-             Case{"busy", ImportReply(UsbIp::OperationStatus::Busy), Errors::Busy},
-             Case{"not available", ImportReply(UsbIp::OperationStatus::NotAvailable), Errors::Busy},
-             Case{"no such device", ImportReply(UsbIp::OperationStatus::NoDevice),
-                  Errors::DeviceNotConnected},
-             Case{"failed", ImportReply(UsbIp::OperationStatus::Failed), Errors::GeneralFailure},
-             Case{"another operation", otherOperation, Errors::DeviceNotConnected},
-             Case{"half a record, then silence", half, Errors::DeviceNotConnected},
-             Case{"silence", {}, Errors::DeviceNotConnected},
-         }) {
-        const auto device = MakeDevice(test.reply);
+    using Status = UsbIp::OperationStatus;
+    for (const auto& [reply, expected] : {std::pair(ImportReply(Status::Busy), Errors::Busy),
+                                          {ImportReply(Status::NotAvailable), Errors::Busy},
+                                          {ImportReply(Status::NoDevice), Errors::DeviceNotConnected},
+                                          {ImportReply(Status::Failed), Errors::GeneralFailure},
+                                          {otherOperation, Errors::DeviceNotConnected},
+                                          {half, Errors::DeviceNotConnected}}) {
+        const auto device = MakeDevice(reply);
         const auto start = Clock::now();
-        EXPECT_EQ(test.expected, device->Claim()) << test.name;
-        EXPECT_LT(Clock::now() - start, std::chrono::seconds(5)) << test.name;
+        EXPECT_EQ(expected, device->Claim());
+        EXPECT_LT(Clock::now() - start, std::chrono::seconds(5));
         TestTransfer transfer = TestTransfer::In(BulkInEndpoint, 1);
-        EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(transfer)) << test.name;
+        EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(transfer));
     }
     const auto unreachable = MakeUsbIpDevice(
         [](ErrorCode& error) {
@@ -353,30 +339,24 @@ TEST(UsbIpListTest, ListsAreReadWithinTheirBounds) {
     record.interfaces = 2;
     const Bytes start = Bytes() + UsbIp::Encode(header);
     const Bytes entry = Bytes() + UsbIp::Encode(record) + Bytes(2 * UsbIp::InterfaceRecordSize);
-    struct Case {
-        const char* name;
-        Bytes reply;
-        std::optional<std::size_t> devices;
-    };
-    for (const Case& test : {
-             Case{"none", start + Bytes(4), 0},
-             Case{"two", start + Bytes{0, 0, 0, 2} + entry + entry, 2},
-             Case{"fewer than announced", start + Bytes{0, 0, 0, 2} + entry, std::nullopt},
-             Case{"far too many", start + Bytes{0xFF, 0xFF, 0xFF, 0xFF}, std::nullopt},
-             Case{"another reply", ImportReply(), std::nullopt},
+    for (const auto& [reply, devices] : std::vector<std::pair<Bytes, std::optional<std::size_t>>>{
+             {start + Bytes(4), 0},
+             {start + Bytes{0, 0, 0, 2} + entry + entry, 2},
+             {start + Bytes{0, 0, 0, 2} + entry, std::nullopt},      // fewer than announced
+             {start + Bytes{0xFF, 0xFF, 0xFF, 0xFF}, std::nullopt},  // far too many
+             {ImportReply(), std::nullopt},
          }) {
         int peer = -1;
-        const auto records = ListUsbIpDevices([&](ErrorCode&) {
+        const auto records = ListUsbIpDevices([&, &reply = reply](ErrorCode&) {
             int files[2] = {-1, -1};
             EXPECT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, files));
-            EXPECT_EQ(static_cast<ssize_t>(test.reply.size()),
-                      send(files[1], test.reply.data(), test.reply.size(), 0));
+            send(files[1], reply.data(), reply.size(), 0);
             shutdown(files[1], SHUT_WR);
             peer = files[1];
             return files[0];
         });
         close(peer);
-        EXPECT_EQ(test.devices, records ? std::optional(records->size()) : std::nullopt) << test.name;
+        EXPECT_EQ(devices, records ? std::optional(records->size()) : std::nullopt);
         if (records && !records->empty()) {
             EXPECT_EQ("1-7", records->front().busId);
         }

@@ -3,24 +3,22 @@
 #include <algorithm>
 #include <random>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "Platform/Usb/UsbDescriptors.h"
 #include "Platform/Usb/UsbIpProtocol.h"
+#include "Support/Bytes.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
 
-using Bytes = std::vector<std::uint8_t>;
+using Tests::Bytes;
 
 template <class Array>
-Bytes ToBytes(const Array& array) {
-    return {array.begin(), array.end()};
-}
-template <class Array>
 Bytes Part(const Array& array, std::size_t start, std::size_t length) {
-    return {array.begin() + static_cast<std::ptrdiff_t>(start),
-            array.begin() + static_cast<std::ptrdiff_t>(start + length)};
+    const auto first = array.begin() + static_cast<std::ptrdiff_t>(start);
+    return {first, first + static_cast<std::ptrdiff_t>(length)};
 }
 
 TEST(UsbIpProtocolTest, PacketsHaveTheirFieldsWhereAKernelLooksForThem) {
@@ -29,17 +27,8 @@ TEST(UsbIpProtocolTest, PacketsHaveTheirFieldsWhereAKernelLooksForThem) {
         UsbIp::Packet packet;
         Bytes start;  ///< the rest of the 48 bytes is zero
     };
-    UsbIp::SubmitPacket control;
-    control.sequence = 0x01020304;
-    control.deviceId = 0x00010002;
-    control.length = 8;
-    control.setup = {0x40, 0xC1, 0x1122, 0x3344, 0x0008};
-    UsbIp::SubmitPacket bulkIn;
-    bulkIn.sequence = 5;
-    bulkIn.deviceId = 0x00010002;
-    bulkIn.endpoint = 0x82;
-    bulkIn.in = true;
-    bulkIn.length = 0x10000;
+    const UsbIp::SubmitPacket control{0x01020304, 0x10002, 0, 8, 0, {0x40, 0xC1, 0x1122, 0x3344, 8}, false};
+    const UsbIp::SubmitPacket bulkIn{5, 0x10002, 0x82, 0x10000, 0, {}, true};
     for (const Case& test : {
              Case{"control out",
                   control,
@@ -61,18 +50,14 @@ TEST(UsbIpProtocolTest, PacketsHaveTheirFieldsWhereAKernelLooksForThem) {
         Bytes expected = test.start;
         expected.resize(48);
         const UsbIp::PacketBytes bytes = UsbIp::Encode(test.packet);
-        EXPECT_EQ(expected, ToBytes(bytes)) << test.name;
+        EXPECT_EQ(expected, Part(bytes, 0, 48)) << test.name;
         EXPECT_EQ(test.packet, UsbIp::DecodePacket(bytes)) << test.name;
     }
 }
 
 TEST(UsbIpProtocolTest, RefusesPacketsThatCannotBeServed) {
-    UsbIp::SubmitPacket submit;
-    submit.sequence = 1;
-    submit.endpoint = 0x82;
-    submit.in = true;
-    submit.length = UsbIp::MaximumPayload;
-    const UsbIp::PacketBytes good = UsbIp::Encode(submit);
+    const UsbIp::PacketBytes good =
+        UsbIp::Encode(UsbIp::SubmitPacket{1, 0, 0x82, UsbIp::MaximumPayload, 0, {}, true});
     ASSERT_TRUE(UsbIp::DecodePacket(good));
     struct Case {
         const char* name;
@@ -98,15 +83,10 @@ TEST(UsbIpProtocolTest, RefusesPacketsThatCannotBeServed) {
     std::fill_n(noPackets.begin() + 0x20, 4, std::uint8_t{0xFF});
     EXPECT_TRUE(UsbIp::DecodePacket(noPackets)) << "the other way to write no isochronous packets";
     EXPECT_FALSE(UsbIp::DecodePacket(UsbIp::Encode(UsbIp::SubmitReply{1, 0, UsbIp::MaximumPayload + 1})));
-}
-
-TEST(UsbIpProtocolTest, AnyHeaderDecodesToNothingOrToItself) {
     std::mt19937 random(1);
     for (int round = 0; round < 20000; ++round) {
         UsbIp::PacketBytes bytes{};
-        for (std::uint8_t& byte : bytes) {
-            byte = random() % 4 == 0 ? static_cast<std::uint8_t>(random()) : std::uint8_t{0};
-        }
+        std::ranges::generate(bytes, [&random] { return random() % 4 == 0 ? random() & 0xFFU : 0; });
         bytes[3] = static_cast<std::uint8_t>(random() % 6);
         if (const auto packet = UsbIp::DecodePacket(bytes)) {
             EXPECT_EQ(packet, UsbIp::DecodePacket(UsbIp::Encode(*packet)));
@@ -114,26 +94,33 @@ TEST(UsbIpProtocolTest, AnyHeaderDecodesToNothingOrToItself) {
     }
 }
 
+/// The kernel's own numbers: EPIPE, EPROTO, EOVERFLOW, ECONNRESET, ENODEV; and ENOENT, ESHUTDOWN and any
+/// other, which it sends as well.
+TEST(UsbIpProtocolTest, StatusesAreTheNumbersOfLinux) {
+    const std::pair<std::int32_t, TransferStatus> sent[] = {
+        {0, TransferStatus::Completed},  {-32, TransferStatus::Stalled},    {-71, TransferStatus::IoError},
+        {-75, TransferStatus::Overflow}, {-104, TransferStatus::Cancelled}, {-19, TransferStatus::DeviceGone},
+    };
+    for (const auto& [number, status] : sent) {
+        EXPECT_EQ(UsbIp::StatusOf(status), number);
+        EXPECT_EQ(UsbIp::TransferStatusOf(number), status) << number;
+    }
+    EXPECT_EQ(UsbIp::TransferStatusOf(-2), TransferStatus::Cancelled);
+    EXPECT_EQ(UsbIp::TransferStatusOf(-108), TransferStatus::DeviceGone);
+    for (const std::int32_t other : {-1, -3, -110, 1, 32}) {
+        EXPECT_EQ(UsbIp::TransferStatusOf(other), TransferStatus::IoError) << other;
+    }
+}
+
 TEST(UsbIpProtocolTest, DeviceRecordsAreCutToTheirFields) {
-    UsbIp::DeviceRecord record;
-    record.path = "/simulated/one";
-    record.busId = "1-2";
-    record.busNumber = 1;
-    record.deviceNumber = 2;
-    record.vendorId = 0x1209;
-    record.productId = 0x0001;
-    record.version = 0x0100;
-    record.classes = {0xFF, 1, 2};
-    record.configurationValue = 1;
-    record.configurations = 1;
-    record.interfaces = 1;
+    UsbIp::DeviceRecord record{"/simulated/one", "1-2",        1, 2, 3, 0x1209, 0x0001,
+                               0x0100,           {0xFF, 1, 2}, 1, 1, 1};
     const UsbIp::DeviceRecordBytes bytes = UsbIp::Encode(record);
     EXPECT_EQ((Bytes{'1', '-', '2', 0}), Part(bytes, 256, 4));
     EXPECT_EQ((Bytes{0, 0, 0, 1, 0, 0, 0, 2, 0, 0, 0, 3, 0x12, 0x09, 0, 1, 1, 0, 0xFF, 1, 2, 1, 1, 1}),
               Part(bytes, 288, 24));
     EXPECT_EQ(record, UsbIp::DecodeDeviceRecord(bytes));
     EXPECT_EQ(0x00010002U, record.DeviceId());
-
     record.path = std::string(300, 'x');
     record.busId = std::string(300, 'y');
     const UsbIp::DeviceRecord cut = UsbIp::DecodeDeviceRecord(UsbIp::Encode(record));
@@ -145,34 +132,43 @@ TEST(UsbIpProtocolTest, DeviceRecordsAreCutToTheirFields) {
 }
 
 TEST(UsbDescriptorsTest, OnlyTheFirstInterfaceCountsAndBrokenOnesEndTheSearch) {
-    const Bytes interface0{9, 4, 0, 0, 1, 0xFF, 0, 0, 0};
+    const Bytes interface0{9, 4, 0, 0, 1, 0xFF, 0, 0, 0}, interface1{9, 4, 1, 0, 1, 0xFF, 0, 0, 0};
     const Bytes alternate1{9, 4, 0, 1, 1, 0xFF, 0, 0, 0};
-    const Bytes bulk{7, 5, 0x82, 2, 0x00, 0x02, 0};
-    const Bytes interrupt{7, 5, 0x84, 3, 0x08, 0x00, 4};
+    const Bytes bulk{7, 5, 0x82, 2, 0x00, 0x02, 0}, interrupt{7, 5, 0x84, 3, 0x08, 0x00, 4};
+    const std::string foundBulk = "82 2 512;", foundInterrupt = "84 3 8;";
     struct Case {
         const char* name;
         std::vector<Bytes> parts;
-        std::vector<int> addresses;
+        std::string endpoints;
     };
     for (const Case& test : {
-             Case{"nothing", {}, {}},
-             Case{"two endpoints", {interface0, bulk, interrupt}, {0x82, 0x84}},
-             Case{"other settings", {interface0, bulk, alternate1, interrupt}, {0x82}},
-             Case{"no interface", {bulk}, {}},
-             Case{"unknown descriptor between", {interface0, {3, 0x99, 7}, bulk}, {0x82}},
-             Case{"length 0", {interface0, {0, 5}, bulk}, {}},
-             Case{"longer than what there is", {interface0, bulk, {7, 5, 0x84, 3, 8}}, {0x82}},
-             Case{"endpoint too short", {interface0, {4, 5, 0x84, 3}, bulk}, {0x82}},
+             Case{"nothing", {}, ""},
+             Case{"two endpoints", {interface0, bulk, interrupt}, foundBulk + foundInterrupt},
+             Case{"other settings", {interface0, bulk, alternate1, interrupt}, foundBulk},
+             Case{"other interfaces", {interface1, bulk, interface0, interrupt}, foundInterrupt},
+             Case{"no interface", {bulk}, ""},
+             Case{"unknown descriptor between", {interface0, {3, 0x99, 7}, bulk}, foundBulk},
+             Case{"length 0", {interface0, {0, 5}, bulk}, ""},
+             Case{"length 1", {interface0, {1}, bulk}, ""},
+             Case{"an interface of 2 bytes", {interface0, {2, 4}, bulk}, foundBulk},
+             Case{"an interface of 3 bytes", {interface0, {3, 4, 0}, bulk}, foundBulk},
+             Case{"an interface of 4 bytes", {{4, 4, 0, 0}, bulk}, foundBulk},
+             Case{"an endpoint of 2 bytes", {interface0, {2, 5}, bulk}, foundBulk},
+             Case{"an endpoint of 5 bytes", {interface0, {5, 5, 0x84, 3, 8}, bulk}, foundBulk},
+             Case{"an endpoint of 6 bytes", {interface0, {6, 5, 0x84, 3, 8, 0}}, foundInterrupt},
+             Case{"longer than what there is", {interface0, bulk, {7, 5, 0x84, 3, 8, 0}}, foundBulk},
+             Case{"a length at the end", {interface0, bulk, {7}}, foundBulk},
          }) {
         Bytes all;
         for (const Bytes& part : test.parts) {
             all.insert(all.end(), part.begin(), part.end());
         }
-        std::vector<int> addresses;
+        std::string endpoints;
         for (const EndpointInfo& endpoint : EndpointsOfFirstInterface(all)) {
-            addresses.push_back(endpoint.address);
+            endpoints += Tests::Hex(&endpoint.address, 1) + " " + std::to_string(endpoint.attributes) + " " +
+                         std::to_string(endpoint.maximumPacketSize) + ";";
         }
-        EXPECT_EQ(test.addresses, addresses) << test.name;
+        EXPECT_EQ(test.endpoints, endpoints) << test.name;
     }
 }
 
