@@ -1,17 +1,29 @@
-// The exported functions with the first, second, third... allocation failing, until a call gets by without a
-// failure.
+// The first, second, third... allocation of a call fails, until one gets by without a failure.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <array>
 #include <cstdio>
+#include <functional>
+#include <iterator>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <utility>
 #include <vector>
 
 #include "ostra.h"
+#include "Platform/EventScheduler.h"
+#include "Platform/Threads.h"
+#include "Platform/Usb/UsbDevice.h"
+#include "Platform/WaitableObjects.h"
+#include "Protocol/Instrument.h"
 #include "Support/ResourceCount.h"
 #include "Support/SimulatedHost.h"
-#include "Sweeps/ExemptDevice.h"
 #include "Sweeps/FailingAllocator.h"
+#include "UsbIo/CUsbIoReader.h"
+#include "UsbIo/CUsbIoWriter.h"
 #include "Utilities/Multithreading/Condition.h"
 #include "VirtualClock.h"
 
@@ -19,6 +31,50 @@ namespace Varnholt::Tests {
 namespace {
 
 using TestSupport::ResourceCount;
+
+/// A device whose own allocations do not fail.
+class ExemptDevice final : public Platform::Usb::UsbDevice {
+  public:
+    explicit ExemptDevice(std::shared_ptr<Platform::Usb::UsbDevice> behind) : device_(std::move(behind)) {}
+    ~ExemptDevice() override {
+        const Exempt guard;
+        device_.reset();
+    }
+    std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
+        return device_->Endpoints(error);
+    }
+    Platform::ErrorCode Claim() override {
+        const Exempt guard;
+        return device_->Claim();
+    }
+    void Release() override {
+        const Exempt guard;
+        device_->Release();
+    }
+    Platform::ErrorCode Submit(Platform::Usb::Transfer& transfer) override {
+        const Exempt guard;
+        return device_->Submit(transfer);
+    }
+    void Cancel(Platform::Usb::Transfer& transfer) override {
+        const Exempt guard;
+        device_->Cancel(transfer);
+    }
+    Platform::ErrorCode ClearHalt(std::uint8_t endpoint) override {
+        const Exempt guard;
+        return device_->ClearHalt(endpoint);
+    }
+
+  private:
+    std::shared_ptr<Platform::Usb::UsbDevice> device_;
+};
+
+/// The virtual clock makes a thread when an event comes while a lock is held; that one is not to be counted.
+void StartTheClocksOwnThread() {
+    Platform::RecursiveMutex section;
+    const std::lock_guard held(section);
+    Platform::ClockScheduler().CallAt(Platform::ClockScheduler().Now() + 1, [] {});
+    Platform::SleepMilliseconds(1);
+}
 
 using Call = std::int32_t (*)();
 
@@ -37,6 +93,7 @@ std::int32_t NamedReadout() {
     return d4fb86cecc88582a(values.data(), "an instrument that is not connected, with a name of some length");
 }
 
+/// An exported function.
 struct Case {
     const char* name;
     Call call;
@@ -105,6 +162,98 @@ TEST(AllocationFailureOfACondition, SaysThatItsStateCannotBeMade) {
         StopFailing();
     }
     EXPECT_THAT(texts, testing::Contains("ConditionImpl::ConditionImpl() can't allocate!"));
+}
+
+// The classes of USBIO, whose operations end with a status.
+
+using namespace UsbIo;
+using namespace Protocol::UsbIoDriver;
+using Protocol::BulkInEndpoint;
+
+constexpr std::uint32_t StatusOf(bool succeeded) {
+    return succeeded ? Status::Success : Status::NoMemory;
+}
+
+std::uint32_t Open() {
+    const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+    CUsbIo device;
+    const std::uint32_t status = list ? device.Open(0, list, &InterfaceClass) : Status::NoMemory;
+    EXPECT_EQ(device.IsOpen(), status == Status::Success);
+    return status;
+}
+
+std::uint32_t UsePool() {
+    CUsbIoBufferPool pool;
+    const bool allocated = pool.Allocate(64, 3);
+    EXPECT_EQ(pool.CurrentCount(), allocated ? 3U : 0U);
+    return StatusOf(allocated && CUsbIoBuffer(64).Buffer != nullptr);
+}
+
+/// Lets the thread of a stream run for a while.
+template <class Stream>
+std::uint32_t RunStream() {
+    Stream stream;
+    {
+        const Exempt guard;
+        const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
+        EXPECT_EQ(stream.Open(0, list, &InterfaceClass), Status::Success);
+        EXPECT_EQ(stream.SetConfiguration({0, std::array<InterfaceSetting, 1>{{{0, 0, 65536}}}}),
+                  Status::Success);
+        EXPECT_EQ(stream.Bind(0, BulkInEndpoint, list, &InterfaceClass), Status::Success);
+    }
+    const bool ran = stream.AllocateBuffers(64, 3) && stream.StartThread();
+    Platform::SleepMilliseconds(10);
+    return StatusOf(stream.ShutdownThread() && ran);
+}
+
+TEST(UsbIoAllocation, EveryFailureIsAStatus) {
+    const std::pair<const char*, std::uint32_t (*)()> operations[] = {{"Open", &Open},
+                                                                      {"UsePool", &UsePool},
+                                                                      {"Reader", &RunStream<CUsbIoReader>},
+                                                                      {"Writer", &RunStream<CUsbIoWriter>}};
+    const Simulator::VirtualClock clock(1);
+    StartTheClocksOwnThread();
+    for (const auto& [name, run] : operations) {
+        bool reached = true;
+        for (int failures = 0; reached && failures < 1000; ++failures) {
+            SCOPED_TRACE(name + std::string(", allocation ") + std::to_string(failures + 1));
+            SimulatedHost host(Transport::UsbIo);
+            host.Add("one");
+            host.Bus().WrapDevices(
+                [](const std::string&, auto opened) { return std::make_shared<ExemptDevice>(opened); });
+            FailAllocation(failures + 1);
+            const std::uint32_t status = run();
+            reached = StopFailing();
+            EXPECT_TRUE(status == Status::Success || (reached && status == Status::NoMemory) ||
+                        (reached && status == Platform::Errors::NotEnoughMemory) ||
+                        (reached && status == Platform::Errors::NoSystemResources))
+                << std::hex << status;
+            EXPECT_EQ(run(), Status::Success) << "nothing is left of the failure";
+            EXPECT_EQ(host.Bus().Instrument("one").PendingTransfers(), 0U);
+        }
+        EXPECT_FALSE(reached) << name;
+    }
+}
+
+/// What the platform keeps of a thread that it did not start takes no memory either.
+TEST(AllocationFailureOfAThread, ItsFirstCallTakesNoMemory) {
+    const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
+    Platform::RecursiveMutex section;
+    const std::array handles{event.Get(), event.Get()};
+    const std::function<void()> calls[] = {
+        [&] { const std::lock_guard hold(section); }, [&] { Platform::SignalEvent(event.Get()); },
+        [&] { Platform::WaitAny(handles, 1); },       [] { Platform::Close(Platform::NoHandle); },
+        [] { Platform::SleepMilliseconds(1); },
+    };
+    for (const auto& call : calls) {
+        bool failed = false;
+        std::thread([&] {
+            FailAllocation(1);
+            call();
+            failed = StopFailing();
+        }).join();
+        EXPECT_FALSE(failed) << "call " << &call - std::begin(calls);
+    }
 }
 
 }  // namespace

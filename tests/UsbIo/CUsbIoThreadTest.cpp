@@ -98,51 +98,51 @@ class Writer final : public Watched<CUsbIoWriter> {
 
 class CUsbIoThreadTest : public Tests::DriverTest {
   protected:
+    void SetUp() override { Bind(reader_, BulkInEndpoint); }
+
     template <class Stream>
     void Bind(Stream& stream, std::uint8_t endpoint) {
         const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
         ASSERT_EQ(stream.Bind(0, endpoint, list, &InterfaceClass), Status::Success);
         driver_.TakeTranscript();
     }
+    void Start(std::uint32_t buffers) {
+        ASSERT_TRUE(reader_.AllocateBuffers(8, buffers));
+        ASSERT_TRUE(reader_.StartThread());
+    }
+    void ExpectEnd(std::uint32_t buffers) {
+        EXPECT_TRUE(reader_.ShutdownThread());
+        EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
+        EXPECT_EQ(reader_.FreeBufferCount(), buffers) << "also the one that was at hand";
+        EXPECT_TRUE(reader_.ShutdownThread());
+    }
+
+    Reader reader_;
 };
 
 TEST_F(CUsbIoThreadTest, ReadsAStreamInOrder) {
-    Reader reader;
-    Bind(reader, BulkInEndpoint);
     std::vector<std::uint8_t> expected;
     for (std::uint8_t i = 0; i < 10; ++i) {
         const Tests::Bytes data(1U + i % 2U, i);  // what a buffer held before must not show behind it
         driver_.Script(BulkInEndpoint, {.data = data, .after = i % 3U * 2U});
         expected.insert(expected.end(), data.begin(), data.end());
     }
-    reader.readsWanted = 10;
-    ASSERT_TRUE(reader.AllocateBuffers(8, 3));
-    ASSERT_TRUE(reader.StartThread());
-    EXPECT_FALSE(reader.StartThread());
-    EXPECT_TRUE(reader.WaitForExit());
-    EXPECT_THAT(reader.Received(), ElementsAreArray(expected));
-    EXPECT_TRUE(reader.ShutdownThread());
-    EXPECT_EQ(reader.FreeBufferCount(), 3U);
+    reader_.readsWanted = 10;
+    Start(3);
+    EXPECT_FALSE(reader_.StartThread());
+    EXPECT_TRUE(reader_.WaitForExit());
+    EXPECT_THAT(reader_.Received(), ElementsAreArray(expected));
+    ExpectEnd(3);
 }
 
 TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
-    Reader reader;
-    Bind(reader, BulkInEndpoint);
     driver_.Script(BulkInEndpoint, {.data = {1}, .after = 1});
-    ASSERT_TRUE(reader.AllocateBuffers(8, 4));
-    const Platform::OwnedHandle completed(Platform::MakeAutoResetEvent());
-    reader.onCompleted = [&] { Platform::SignalEvent(completed.Get()); };
-    ASSERT_TRUE(reader.StartThread());
-    ASSERT_EQ(Platform::Wait(completed.Get(), Limit), Platform::WaitResult::Signalled);
-    WaitUntil([&] { return driver_.Running(BulkInEndpoint) == 4; });
-    reader.onCompleted = {};
+    Start(4);
+    WaitUntil([&] { return !reader_.Received().empty() && driver_.Running(BulkInEndpoint) == 4; });
     const Tests::Stopwatch stopwatch(clock_);
-    EXPECT_TRUE(reader.ShutdownThread());
+    ExpectEnd(4);
     stopwatch.ExpectAtMost(0);
     EXPECT_THAT(driver_.TakeTranscript(), testing::Contains("control 80942084 /")) << "aborted";
-    EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
-    EXPECT_EQ(reader.FreeBufferCount(), 4U);
-    EXPECT_TRUE(reader.ShutdownThread());
 }
 
 TEST_F(CUsbIoThreadTest, EndsAfterTooManyErrorsInARow) {
@@ -186,8 +186,6 @@ TEST_F(CUsbIoThreadTest, EndsAfterTooManyErrorsInARow) {
 }
 
 TEST_F(CUsbIoThreadTest, AReadStartedBehindTheAbortDoesNotHoldUpTheEnd) {
-    Reader reader;
-    Bind(reader, BulkInEndpoint);
     const Platform::OwnedHandle started(Platform::MakeAutoResetEvent());
     const Platform::OwnedHandle aborted(Platform::MakeAutoResetEvent());
     driver_.Script(BulkInEndpoint, {.after = Never, .onStart = [&] {
@@ -196,37 +194,27 @@ TEST_F(CUsbIoThreadTest, AReadStartedBehindTheAbortDoesNotHoldUpTheEnd) {
                                         Platform::SleepMilliseconds(20);
                                     }});
     driver_.Script(Control::AbortPipe, {.onStart = [&] { Platform::SignalEvent(aborted.Get()); }});
-    ASSERT_TRUE(reader.AllocateBuffers(8, 2));
-    ASSERT_TRUE(reader.StartThread());
+    Start(2);
     ASSERT_EQ(Platform::Wait(started.Get(), Limit), Platform::WaitResult::Signalled);
-    EXPECT_TRUE(reader.ShutdownThread());
-    EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
-    EXPECT_EQ(reader.FreeBufferCount(), 2U);
+    ExpectEnd(2);
 }
 
 TEST_F(CUsbIoThreadTest, TheThreadItselfCanAskForItsEnd) {
-    Reader reader;
-    Bind(reader, BulkInEndpoint);
     driver_.Script(BulkInEndpoint, {.data = {1}, .after = 1});
     bool answer = true;
-    reader.onCompleted = [&] { answer = reader.ShutdownThread(); };
-    ASSERT_TRUE(reader.AllocateBuffers(8, 1));
-    ASSERT_TRUE(reader.StartThread());
-    EXPECT_TRUE(reader.WaitForExit());
+    reader_.onCompleted = [&] { answer = reader_.ShutdownThread(); };
+    Start(1);
+    EXPECT_TRUE(reader_.WaitForExit());
     EXPECT_FALSE(answer);
-    EXPECT_TRUE(reader.ShutdownThread());
+    ExpectEnd(1);
 }
 
 TEST_F(CUsbIoThreadTest, SomethingThrownEndsTheThread) {
-    Reader reader;
-    Bind(reader, BulkInEndpoint);
     driver_.Script(BulkInEndpoint, {.data = {1}, .after = 1});
-    reader.onCompleted = [] { throw 7; };
-    ASSERT_TRUE(reader.AllocateBuffers(8, 3));
-    ASSERT_TRUE(reader.StartThread());
-    WaitUntil([&] { return !reader.Received().empty() && driver_.Running(BulkInEndpoint) == 0; });
-    EXPECT_TRUE(reader.ShutdownThread());
-    EXPECT_EQ(reader.FreeBufferCount(), 3U) << "also the one that was at hand";
+    reader_.onCompleted = [] { throw 7; };
+    Start(3);
+    WaitUntil([&] { return !reader_.Received().empty() && driver_.Running(BulkInEndpoint) == 0; });
+    ExpectEnd(3);
 }
 
 TEST_F(CUsbIoThreadTest, WritesUntilFinished) {

@@ -15,7 +15,6 @@ namespace {
 
 using DeviceDriver::Generic::Utilities::DataException;
 using testing::HasSubstr;
-using testing::StartsWith;
 
 template <class Body>
 void Traced(Body body) try {
@@ -33,8 +32,7 @@ Thrown Catch(Body body) {
     throw std::logic_error("expected another exception");
 }
 
-class Inner {
-  public:
+struct Inner {
     static void Fail(int) try {
         throw DataException("bad data", FormatLocation("", "Inner::Fail", "C:\\x\\src\\a\\src\\b.cpp", 292));
     }
@@ -46,11 +44,6 @@ class Inner {
 class StreamFailure : public std::runtime_error {
     using std::runtime_error::runtime_error;
 };
-
-TEST(Exceptions, LocationKeepsTheFileFromTheLastSourceRoot) {
-    EXPECT_EQ(FormatLocation("", "A::f", "C:\\src\\old\\src\\B/c.cpp", 7), "::A::f(): \\src\\B/c.cpp:7");
-    EXPECT_EQ(FormatLocation("ctx", "f", "plain.cpp", 7), "ctx::f(): plain.cpp:7");
-}
 
 TEST(Exceptions, QualifiedNamesComeOutOfSignatures) {
     const std::vector<std::pair<const char*, const char*>> cases{
@@ -68,30 +61,17 @@ TEST(Exceptions, QualifiedNamesComeOutOfSignatures) {
 }
 
 TEST(Exceptions, TraceGrowsByOneEntryPerOperationLeft) {
-    try {
-        Inner::Outer();
-        FAIL();
-    } catch (const DataException& exception) {
-        ASSERT_EQ(exception.GetTrace().size(), 3U);
-        for (const std::string& entry : exception.GetTrace()) {
-            EXPECT_THAT(entry, StartsWith("::"));
-        }
-        EXPECT_EQ(exception.GetTrace().front(), "::Inner::Fail(): \\src\\b.cpp:292");
-        EXPECT_THAT(exception.GetTrace().back(), HasSubstr("Inner::Outer(): "));
-        EXPECT_STREQ(exception.what(), "bad data");
-    }
-}
+    const auto exception = Catch<DataException>([] { Inner::Outer(); });
+    const auto& trace = exception.GetTrace();
+    ASSERT_EQ(trace.size(), 4U);
+    EXPECT_EQ(trace.front(), "::Inner::Fail(): \\src\\b.cpp:292") << "the file from its last source root on";
+    EXPECT_THAT(*std::next(trace.begin(), 2), testing::ContainsRegex("^::.*Inner::Outer\\(\\): .*cpp:."));
+    EXPECT_STREQ(exception.what(), "bad data");
+    EXPECT_EQ(FormatLocation("ctx", "f", "plain.cpp", 7), "ctx::f(): plain.cpp:7");
 
-TEST(Exceptions, LibrarySourcesAreNamedFromTheSourceRoot) {
-    try {
-        *Tools::SmartPointer<Inner>();
-        FAIL();
-    } catch (const NullPointerException& exception) {
-        EXPECT_THAT(exception.what(), StartsWith("accessed null pointer ("));
-        EXPECT_THAT(exception.what(), HasSubstr("Inner"));
-        ASSERT_EQ(exception.GetTrace().size(), 2U);
-        EXPECT_THAT(exception.GetTrace().front(), HasSubstr("(): \\src\\Utilities/Tools/SmartPointer.h:"));
-    }
+    const auto null = Catch<NullPointerException>([] { *Tools::SmartPointer<Inner>(); });
+    EXPECT_THAT(null.what(), testing::ContainsRegex("^accessed null pointer \\(.*Inner"));
+    EXPECT_THAT(null.GetTrace().front(), HasSubstr("(): \\src\\Utilities/Tools/SmartPointer.h:"));
 }
 
 template <class Standard, class Expected>
@@ -123,25 +103,13 @@ TEST(Exceptions, StandardExceptionsAreTranslatedByExactType) {
     EXPECT_STREQ(Catch<RuntimeException>([] { throw 7; }).what(), "unkown exception caught");
 }
 
-TEST(Exceptions, VerboseTextShowsTheTrace) {
+TEST(Exceptions, VerboseTextShowsTheTraceAndASnapshotOfTheCause) {
     RuntimeException exception("message", "A");
     exception.AddLocation("");
     exception.AddLocation("B");
-    const RuntimeException silent("alone", "");
-    SetVerboseText(true);
-    EXPECT_STREQ(exception.what(), "message\n\tA\n\tB");
-    EXPECT_STREQ(static_cast<const std::runtime_error&>(exception).what(), "message\n\tA\n\tB");
-    EXPECT_STREQ(silent.what(), "alone");
-    SetVerboseText(false);
-    EXPECT_STREQ(exception.what(), "message");
-}
-
-TEST(Exceptions, CauseIsASnapshot) {
-    RuntimeException exception("message", "A");
-    exception.AddLocation("");
     const std::pair<Cause, std::string> cases[] = {
         {Cause(static_cast<const std::runtime_error&>(exception)),
-         "\ncaused by: " + Tools::ReadableName(typeid(RuntimeException)) + ": message\n\tA\n"},
+         "\ncaused by: " + Tools::ReadableName(typeid(RuntimeException)) + ": message\n\tA\n\tB\n"},
         {Cause(StreamFailure("message")),
          "\ncaused by: " + Tools::ReadableName(typeid(StreamFailure)) + ": message\n"},
         {Cause(), ""},
@@ -151,10 +119,9 @@ TEST(Exceptions, CauseIsASnapshot) {
         cause.Print(text);
         EXPECT_EQ(text.str(), expected);
         EXPECT_STREQ(cause.what(), expected.empty() ? "" : "message");
-        EXPECT_EQ(cause.IsEmpty(), expected.empty());
-
         const BadAllocException recorded("", "B", cause);
         EXPECT_EQ(recorded.GetCause().IsEmpty(), expected.empty());
+        EXPECT_STREQ(recorded.what(), "bad allocation");
         SetVerboseText(true);
         EXPECT_EQ(recorded.what(), "bad allocation\n\tB" + expected);
         SetVerboseText(false);
@@ -183,13 +150,10 @@ TEST(SmartPointer, SharesAndReleases) {
 TEST(LexicalCast, RefusesWhatDoesNotBeginWithTheTarget) {
     EXPECT_EQ(Tools::lexical_cast<std::string>(42U), "42");
     EXPECT_EQ(Tools::lexical_cast<int>("17 mm"), 17);
-    try {
-        Tools::lexical_cast<int>(std::string("x17"));
-        FAIL();
-    } catch (const std::invalid_argument& exception) {
-        EXPECT_THAT(exception.what(), StartsWith("lexical_cast(): fail to convert 'x17' from "));
-        EXPECT_THAT(exception.what(), HasSubstr(" to int"));
-    }
+    const auto refused =
+        Catch<InvalidArgumentException>([] { Tools::lexical_cast<int>(std::string("x17")); });
+    EXPECT_THAT(refused.what(),
+                testing::ContainsRegex("^lexical_cast\\(\\): fail to convert 'x17' from .* to int"));
 }
 
 }  // namespace

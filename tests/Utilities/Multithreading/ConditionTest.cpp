@@ -1,8 +1,7 @@
-#include <gtest/gtest.h>
-
-#include <atomic>
+// Mutexes, semaphores and conditions.
 #include <chrono>
 #include <functional>
+#include <limits>
 #include <memory>
 #include <string>
 #include <thread>
@@ -10,7 +9,7 @@
 #include <vector>
 
 #include "Platform/CallFilter.h"
-#include "Support/ExpectThrow.h"
+#include "Support/DriverTest.h"
 #include "Utilities/Exceptions/Exceptions.h"
 #include "Utilities/Multithreading/Condition.h"
 #include "Utilities/Multithreading/ScopedLock.h"
@@ -18,73 +17,39 @@
 namespace Varnholt::Utilities::Multithreading {
 namespace {
 
-using namespace std::chrono_literals;
+using Exceptions::InvalidArgumentException;
 using Exceptions::ResourceException;
+using Platform::SleepMilliseconds;
+using Tests::BackgroundThread;
 using Tests::ExpectThrow;
+using Tests::WaitUntil;
 
-constexpr auto ALittle = 30ms;
-
+/// Of this process and test alone.
 std::string UniqueName() {
-    return "ostra-condition-test-" +
-           std::to_string(std::chrono::steady_clock::now().time_since_epoch().count());
+    static int count = 0;
+    return "ostra-test-" + std::to_string(std::chrono::steady_clock::now().time_since_epoch().count()) + "-" +
+           std::to_string(++count);
 }
 
-/// A condition with some threads that wait for it.
-class ConditionTest : public testing::Test {
+void Elsewhere(std::function<void()> work) {
+    BackgroundThread(std::move(work)).Join();
+}
+
+/// Whether another thread can have the lock at once; it gives it back.
+bool IsFree(SynchronizationObject& lock) {
+    bool acquired = false;
+    Elsewhere([&] {
+        acquired = lock.TryLock(0);
+        if (acquired) {
+            lock.Unlock();
+        }
+    });
+    return acquired;
+}
+
+class Locks : public testing::Test {
   protected:
-    ~ConditionTest() override {
-        Platform::InstallCallFilter({});
-        condition_.broadcast();  // lets go whom a failed test has left
-        for (std::thread& thread : threads_) {
-            thread.join();
-        }
-    }
-
-    /// Returns once all of them are in `Wait`: they hold the mutex until they are counted there.
-    void StartWaiters(int count) {
-        for (int i = 0; i < count; ++i) {
-            threads_.emplace_back([this] {
-                const ScopedLock lock(mutex_);
-                ++waiting_;
-                try {
-                    EXPECT_TRUE(condition_.Wait(0));
-                } catch (const ResourceException& exception) {
-                    failure_ = exception.what();
-                    std::thread([this] {
-                        EXPECT_TRUE(mutex_.TryLock(1000)) << "a wait that has failed holds nothing";
-                        mutex_.Unlock();
-                    }).join();
-                    mutex_.Lock();  // the scope's unlock finds nothing to unlock otherwise
-                }
-                --waiting_;
-                ++woken_;
-            });
-        }
-        Await([this, count] { return waiting_ == count; });
-    }
-
-    template <class State>
-    bool Await(State state) {
-        for (int i = 0; i < 5000; ++i) {
-            {
-                const ScopedLock lock(mutex_);
-                if (state()) {
-                    return true;
-                }
-            }
-            std::this_thread::sleep_for(1ms);
-        }
-        ADD_FAILURE() << "waited in vain: " << waiting_ << " waiting, " << woken_ << " woken";
-        return false;
-    }
-
-    /// So many wake up, and no more a little later.
-    void ExpectWoken(int count) {
-        Await([this, count] { return woken_ == count; });
-        std::this_thread::sleep_for(ALittle);
-        const ScopedLock lock(mutex_);
-        EXPECT_EQ(woken_, count);
-    }
+    ~Locks() override { Platform::InstallCallFilter({}); }
 
     /// Makes a call fail, on this thread only when others are in the middle of theirs.
     static void MakeFail(const std::string& name) {
@@ -94,15 +59,136 @@ class ConditionTest : public testing::Test {
         });
     }
 
+    const Tests::TestClock clock_{Tests::TestTime::RealForThreadSanitizer};
     Mutex mutex_{UniqueName()};
+};
+
+TEST_F(Locks, AMutexOfOneNameIsRecursiveAndOneLock) {
+    const std::string name = UniqueName();
+    auto original = std::make_unique<SynchronizationObject>(CreateMutexImpl(name));
+    SynchronizationObject copy(*original);
+    Mutex sameName(name);
+    original->Lock();
+    copy.Lock();
+    for (const bool isFree : {false, true}) {
+        original.reset();  // the lock lives with the last of them
+        copy.Unlock();
+        EXPECT_EQ(IsFree(copy), isFree) << "as many unlocks as locks";
+        EXPECT_EQ(IsFree(sameName), isFree);
+        EXPECT_TRUE(IsFree(mutex_));
+    }
+}
+
+TEST_F(Locks, ANamelessMutexIsItsOwnAndHasNoTimeouts) {
+    Mutex mutex(""), other("");
+    auto hold = std::make_unique<ScopedLock>(mutex);
+    mutex.Lock();
+    mutex.Unlock();
+    Elsewhere([&] { const ScopedLock lockOther(other); });
+    BackgroundThread waiting([&] { const ScopedLock held(mutex); });
+    SleepMilliseconds(30);
+    EXPECT_FALSE(waiting.HasEnded());
+    hold.reset();
+    waiting.Join();
+    ExpectThrow<std::runtime_error>(
+        "CriticalSection::TryLock: not yet implemented (TryEnterCriitcalSection not exists on  Win9X)",
+        [&] { mutex.TryLock(0); });
+    Elsewhere([&] { const ScopedLock lock(mutex); });  // the refusal has not locked
+}
+
+TEST_F(Locks, TimeoutIsALimitAndNegativeIsNone) {
+    for (const int timeout : {-1, std::numeric_limits<int>::min()}) {
+        BackgroundThread owner([&] {
+            mutex_.Lock();
+            SleepMilliseconds(30);
+            mutex_.Unlock();
+        });
+        WaitUntil([&] { return !IsFree(mutex_); });
+        EXPECT_FALSE(mutex_.TryLock(1));
+        EXPECT_TRUE(mutex_.TryLock(timeout));
+        mutex_.Unlock();
+    }
+}
+
+TEST_F(Locks, ASemaphoreStartsAtOneAndEachUnlockGivesOneBackUpToTheMaximum) {
+    const std::string name = UniqueName();
+    SynchronizationObject semaphore(CreateSemaphoreImpl(name, 3)), sameName(CreateSemaphoreImpl(name, 3));
+    for (const int unlocks : {1, 2, 5}) {
+        int taken = 0;
+        for (; sameName.TryLock(0); ++taken) {
+        }
+        EXPECT_EQ(taken, std::min(unlocks, 3));
+        for (int i = 0; i < (unlocks == 1 ? 2 : 5); ++i) {
+            Elsewhere([&] { semaphore.Unlock(); });
+        }
+    }
+}
+
+TEST_F(Locks, FailuresAreInvalidArguments) {
+    MakeFail("MakeSemaphore");
+    ExpectThrow<InvalidArgumentException>("handle is NULL", [] { CreateSemaphoreImpl("", 1); });
+    MakeFail("Wait");
+    ExpectThrow<InvalidArgumentException>("invalid mutex", [&] { mutex_.TryLock(0); });
+    Platform::InstallCallFilter({});
+    Elsewhere([&] { mutex_.Lock(); });  // abandons it
+    ExpectThrow<InvalidArgumentException>("invalid mutex", [&] { mutex_.TryLock(1000); });
+    EXPECT_TRUE(IsFree(mutex_)) << "whoever was told of a failure does not hold the mutex";
+    Elsewhere([&] { mutex_.Lock(); });
+    mutex_.Lock();  // does not look at the outcome: acquired all the same
+    EXPECT_FALSE(IsFree(mutex_));
+    mutex_.Unlock();
+}
+
+/// A condition with some threads that wait for it.
+class ConditionTest : public Locks {
+  protected:
+    ~ConditionTest() override {
+        Platform::InstallCallFilter({});
+        condition_.broadcast();  // lets go whom a failed test has left
+        threads_.clear();
+    }
+
+    /// Returns once all of them are in `Wait`: they hold the mutex until they are counted there.
+    void StartWaiters(int count) {
+        for (int i = 0; i < count; ++i) {
+            threads_.push_back(std::make_unique<BackgroundThread>([this] {
+                const ScopedLock lock(mutex_);
+                ++waiting_;
+                try {
+                    EXPECT_TRUE(condition_.Wait(0));
+                } catch (const ResourceException& exception) {
+                    failure_ = exception.what();
+                    EXPECT_TRUE(IsFree(mutex_)) << "a wait that has failed holds nothing";
+                    mutex_.Lock();  // the scope's unlock finds nothing to unlock otherwise
+                }
+                --waiting_;
+                ++woken_;
+            }));
+        }
+        Await(waiting_, count);
+    }
+    void Await(const int& counter, int value) {
+        WaitUntil([&] {
+            const ScopedLock lock(mutex_);
+            return counter == value;
+        });
+    }
+    /// So many wake up, and no more a little later.
+    void ExpectWoken(int count) {
+        Await(woken_, count);
+        SleepMilliseconds(30);
+        const ScopedLock lock(mutex_);
+        EXPECT_EQ(woken_, count);
+    }
+
     Condition condition_{mutex_};
-    // Guarded by `mutex`.
+    // Guarded by the mutex.
     int waiting_ = 0;
     int woken_ = 0;
     std::string failure_;
 
   private:
-    std::vector<std::thread> threads_;
+    std::vector<std::unique_ptr<BackgroundThread>> threads_;
 };
 
 TEST_F(ConditionTest, SignalWakesOneAndIsForgottenWithoutAWaiter) {
@@ -124,7 +210,7 @@ TEST_F(ConditionTest, BroadcastReturnsWhenAllHaveLeftAndLeavesNothingBehind) {
             condition_.broadcast();
             EXPECT_EQ(woken_, 3 * (round - 1)) << "the mutex is still held here";
         }
-        Await([&] { return woken_ == 3 * round; });
+        Await(woken_, 3 * round);
     }
     StartWaiters(2);
     ExpectWoken(6);  // no wake-up is left over
@@ -134,7 +220,13 @@ TEST_F(ConditionTest, BroadcastReturnsWhenAllHaveLeftAndLeavesNothingBehind) {
     ExpectWoken(8);
 }
 
-TEST_F(ConditionTest, NeedsAMutexWithAName) {
+TEST_F(ConditionTest, NeedsItsObjectsAndAMutexWithAName) {
+    for (const char* call : {"MakeSemaphore", "MakeAutoResetEvent"}) {
+        MakeFail(call);
+        ExpectThrow<ResourceException>("ConditionImpl::ConditionImpl() can't create!",
+                                       [&] { const Condition refused(mutex_); });
+    }
+    Platform::InstallCallFilter({});
     Mutex nameless("");
     Condition refused(nameless);
     const ScopedLock lock(nameless);
@@ -143,52 +235,42 @@ TEST_F(ConditionTest, NeedsAMutexWithAName) {
     refused.broadcast();  // would wait for ever for a waiter that is still counted
 }
 
-TEST_F(ConditionTest, CannotBeMadeWithoutItsObjects) {
-    for (const char* call : {"MakeSemaphore", "MakeAutoResetEvent"}) {
-        MakeFail(call);
-        SCOPED_TRACE(call);
-        ExpectThrow<ResourceException>("ConditionImpl::ConditionImpl() can't create!",
-                                       [&] { const Condition refused(mutex_); });
-    }
-}
-
-TEST_F(ConditionTest, FailedReleaseUnlocksTheMutexAndKeepsNothingLocked) {
-    struct Case {
-        const char* name;
-        void (Condition::*operation)();
+TEST_F(ConditionTest, AFailedWakeUnlocksTheMutexAndKeepsNothingLocked) {
+    const struct {
+        const char* failing;
+        void (Condition::*wake)();
         const char* message;
+        int woken;
+    } cases[] = {
+        {"ReleaseSemaphore", &Condition::signal, "Condition::signal() invalid condition!", 0},
+        {"ReleaseSemaphore", &Condition::broadcast, "Condition::broadcast() unable to release semaphore!", 0},
+        {"Wait", &Condition::broadcast, "Condition::broadcast() invalid event!", 2},
     };
     StartWaiters(2);
-    for (const Case& row :
-         {Case{"signal", &Condition::signal, "Condition::signal() invalid condition!"},
-          Case{"broadcast", &Condition::broadcast, "Condition::broadcast() unable to release semaphore!"}}) {
-        SCOPED_TRACE(row.name);
+    for (const auto& row : cases) {
         mutex_.Lock();
-        MakeFail("ReleaseSemaphore");
-        ExpectThrow<ResourceException>(row.message, [&] { (condition_.*row.operation)(); });
+        MakeFail(row.failing);
+        ExpectThrow<ResourceException>(row.message, [&] { (condition_.*row.wake)(); });
         Platform::InstallCallFilter({});
-        std::thread([&] {
+        Elsewhere([this] {
             EXPECT_TRUE(mutex_.TryLock(1000)) << "must have been unlocked";
             mutex_.Unlock();
-        }).join();
+        });
+        ExpectWoken(row.woken);
     }
-    ExpectWoken(0);
-    std::thread([this] { condition_.signal(); }).join();  // another thread gets into the state's own lock
-    ExpectWoken(1);
-    condition_.broadcast();
-    ExpectWoken(2);
-}
-
-TEST_F(ConditionTest, BroadcastReportsAnEventItCannotWaitFor) {
-    StartWaiters(2);
-    mutex_.Lock();
-    MakeFail("Wait");
-    ExpectThrow<ResourceException>("Condition::broadcast() invalid event!", [&] { condition_.broadcast(); });
-    Platform::InstallCallFilter({});
-    Await([this] { return woken_ == 2; });  // which needs the mutex that the failure has unlocked
+    StartWaiters(1);
+    Elsewhere([this] { condition_.signal(); });  // another thread gets into the state's own lock
+    ExpectWoken(3);
 }
 
 TEST_F(ConditionTest, WaiterThatCannotTakeTheMutexAgainSaysSo) {
+    const auto onceAtTheWaiter = [](std::string_view name, std::function<Platform::ErrorCode()> action) {
+        Platform::InstallCallFilter(
+            [=, done = false, waker = std::this_thread::get_id()](std::string_view call) mutable {
+                const bool isMeant = call == name && std::this_thread::get_id() != waker;
+                return isMeant && !std::exchange(done, true) ? action() : Platform::Errors::Success;
+            });
+    };
     const struct {
         const char* name;
         void (Condition::*wake)();
@@ -197,35 +279,49 @@ TEST_F(ConditionTest, WaiterThatCannotTakeTheMutexAgainSaysSo) {
     } cases[] = {{"woken alone", &Condition::signal, "Wait", true},
                  {"last of a broadcast", &Condition::broadcast, "SignalAndWait", true},
                  {"last, abandoned mutex", &Condition::broadcast, "SignalAndWait", false}};
-    const auto onceAtTheWaiters = [](std::string_view name, std::function<Platform::ErrorCode()> action) {
-        auto done = std::make_shared<std::atomic<bool>>(false);
-        Platform::InstallCallFilter([=, waker = std::this_thread::get_id()](std::string_view call) {
-            const bool isMeant = call == name && std::this_thread::get_id() != waker;
-            return isMeant && !done->exchange(true) ? action() : Platform::Errors::Success;
-        });
-    };
     for (const auto& row : cases) {
         SCOPED_TRACE(row.name);
         StartWaiters(1);
-        onceAtTheWaiters(row.call, [this, fails = row.fails] {
+        onceAtTheWaiter(row.call, [this, fails = row.fails] {
             if (!fails) {
-                std::thread([this] { mutex_.Lock(); }).join();
+                Elsewhere([this] { mutex_.Lock(); });
             }
             return fails ? Platform::Errors::InvalidHandle : Platform::Errors::Success;
         });
         (condition_.*row.wake)();
-        Await([this] { return waiting_ == 0; });
+        Await(waiting_, 0);
         EXPECT_EQ(std::exchange(failure_, ""), "Condition::Wait() invalid mutex! (must be a real mutex)");
     }
+    bool hasLeft = false;
     StartWaiters(1);
-    std::atomic<bool> hasLeft = false;
-    onceAtTheWaiters("SignalAndWait", [&] {
-        std::this_thread::sleep_for(ALittle);
+    onceAtTheWaiter("SignalAndWait", [&] {
+        SleepMilliseconds(30);
         hasLeft = true;
         return Platform::Errors::Success;
     });
     condition_.broadcast();
     EXPECT_TRUE(hasLeft) << "what the failures left behind passed for the end of this broadcast";
+}
+
+/// One that was counted and then cannot wait: a broadcast that has begun by then must not wait for it.
+TEST_F(ConditionTest, ABroadcastEndsWithAWaiterThatCannotWait) {
+    Platform::InstallCallFilter([](std::string_view call) {
+        if (call != "SignalAndWait") {
+            return Platform::Errors::Success;
+        }
+        SleepMilliseconds(50);
+        return Platform::Errors::InvalidHandle;
+    });
+    BackgroundThread waiter([this] {
+        mutex_.Lock();
+        ExpectThrow<ResourceException>("Condition::Wait() invalid Mutex! (must be a real mutex)",
+                                       [this] { condition_.Wait(0); });
+    });
+    SleepMilliseconds(10);
+    condition_.broadcast();
+    waiter.Join();
+    EXPECT_TRUE(mutex_.TryLock(0)) << "a wait that has failed holds nothing";
+    mutex_.Unlock();
 }
 
 }  // namespace

@@ -2,6 +2,7 @@
 #include <functional>
 
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
+#include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
 #include "NativeTest.h"
 #include "Platform/CallFilter.h"
 #include "Utilities/Multithreading/Mutex.h"
@@ -15,15 +16,117 @@ using DeviceDriver::Generic::MessageButtonData;
 using DeviceDriver::Generic::MessageDeviceGone;
 using DeviceDriver::Ostra::LowLevel::PellandoUSBDevice;
 using DeviceDriver::Ostra::LowLevel::ScanRecordList;
+using DeviceDriver::Ostra::LowLevel::USBConnection;
+using Protocol::NativeDriver::ControlBlock;
 using testing::ElementsAre;
 using testing::IsEmpty;
-using testing::SizeIs;
 using Varnholt::Utilities::Multithreading::Mutex;
 using Varnholt::Utilities::Multithreading::ScopedLock;
 
 constexpr std::uint32_t InterruptPipe = 3;
 const Answer ButtonData{.data = {1}};
 const std::string Path = "native/1";
+
+void FailCalls(std::string_view name) {
+    InstallCallFilter(
+        [name](std::string_view call) { return call == name ? Errors::NoSystemResources : Errors::Success; });
+}
+
+using UsbConnection = NativeTest;
+
+TEST_F(UsbConnection, LeavesNothingOpenOfWhatItCannotMakeOrOpensAnew) {
+    driver_.RefuseOpen("native/1\\PIPE01", Errors::AccessDenied);
+    ExpectThrow<IOException>("could not open pipe:" + ErrorSuffix(Errors::AccessDenied),
+                             [] { const USBConnection connection(Path, 1, NoHandle); });
+    FailCalls("MakeAutoResetEvent");
+    ExpectThrow<IOException>("could not create pipe-event-handle",
+                             [] { const USBConnection connection(Path, 2, NoHandle); });
+    InstallCallFilter({});
+    EXPECT_EQ(driver_.OpenFiles(), 0u);
+
+    const OwnedHandle event(MakeAutoResetEvent());
+    {
+        USBConnection connection(Path, 2, NoHandle);
+        const Handle own = connection.CompletionEvent();
+        connection.OpenConnection(event.Get());
+        EXPECT_FALSE(SignalEvent(own)) << "closed with the connection";
+        EXPECT_EQ(connection.CompletionEvent(), event.Get());
+        EXPECT_EQ(driver_.OpenFiles(), 1u);
+    }
+    EXPECT_EQ(driver_.OpenFiles(), 0u);
+    EXPECT_TRUE(SignalEvent(event.Get())) << "which is its owner's";
+}
+
+/// The buffer dies with its operation: a transfer that outlived it would write into freed memory.
+void Transfer(USBConnection& connection, std::uint32_t pipe) {
+    const auto buffer = std::make_unique<std::uint8_t[]>(64);
+    ControlBlock inward{1};
+    pipe == 1   ? connection.Read(buffer.get(), 64, 64)
+    : pipe == 2 ? connection.Write(buffer.get(), 64, 640)
+                : static_cast<void>(connection.PerformDeviceIOControl(
+                      inward, Protocol::NativeDriver::ControlVendorRequest, buffer.get(), 64, true));
+}
+
+TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
+    const Bytes data = Counting(64, 1);
+    const Answer slow{.data = data, .after = Never, .cancelledAfter = 40, .cancelledWithData = true};
+    const std::string timedOut = "Device IO control failed ", few = " data failed (Not enough data)";
+    const struct {
+        const char* name;
+        std::uint32_t pipe;  ///< 0: a control
+        Answer answer;
+        std::uint64_t milliseconds;  ///< until the operation returns
+        std::string text;            ///< of the failure
+    } cases[] = {
+        {"control, slow", 0, slow, 2041, timedOut + ErrorSuffix(Errors::IoPending)},
+        {"control, not started", 0, {.refusal = 5}, 2001, timedOut + ErrorSuffix(5)},
+        {"read, slow", 1, slow, 5104, "read data failed" + ErrorSuffix(Errors::IoIncomplete)},
+        {"read, stalled behind all data",
+         1,
+         {.data = data, .code = 31},
+         0,
+         "read data failed" + ErrorSuffix(31)},
+        {"read, short", 1, {.data = Bytes(60)}, 0, "read" + few},
+        {"read, longer", 1, {.data = data, .count = 65}, 0, "read" + few},
+        {"write, short", 2, {.count = 63}, 0, "write" + few},
+    };
+    for (const auto& row : cases) {
+        SCOPED_TRACE(row.name);
+        USBConnection connection(Path, row.pipe, NoHandle);
+        driver_.Script(row.pipe, row.answer);
+        const Stopwatch watch(clock_);
+        const auto operation = [&] { Transfer(connection, row.pipe); };
+        row.pipe == 0 ? ExpectThrow<TimeoutException>(row.text, operation)
+                      : ExpectThrow<IOException>(row.text, operation);
+        watch.Expect(row.milliseconds);
+        EXPECT_EQ(driver_.RunningTransfers(), 0u);
+    }
+}
+
+TEST_F(UsbConnection, GivesWhatAnInterruptBroughtUntilSomebodySignalsItsEvent) {
+    const OwnedHandle event(MakeAutoResetEvent());
+    USBConnection connection(Path, 3, event.Get());
+    std::atomic<bool> endRequested = false;
+    Bytes buffer(8);
+    const auto read = [&](Answer answer) {
+        driver_.Script(3, std::move(answer));
+        return connection.Read(buffer, endRequested);
+    };
+    EXPECT_EQ(read({.data = Counting(3, 1), .after = clock_.IsVirtual() ? 100'000U : 100U}), 3u);
+    EXPECT_THAT(buffer, ElementsAre(1, 2, 3, 0, 0, 0, 0, 0));
+    EXPECT_EQ(read({.data = Counting(9, 1), .after = 1}), 8u);
+    EXPECT_EQ(read({.code = Errors::DeviceNotConnected, .after = 5}), 0u);
+    EXPECT_EQ(read({.refusal = Errors::AccessDenied}), 0u) << "or it would wait for ever";
+
+    for (const bool arrives : {false, true}) {
+        ClockScheduler().CallAt(ClockScheduler().Now() + 100'000, [&] { SignalEvent(event.Get()); });
+        EXPECT_EQ(
+            read({.data = Counting(2, 1), .after = Never, .cancelledAfter = 3, .cancelledWithData = arrives}),
+            arrives ? 2u : 0u)
+            << "data that arrive during the cancellation count";
+        EXPECT_EQ(driver_.RunningTransfers(), 0u);
+    }
+}
 
 void ReadOneByte(PellandoUSBDevice& device) {
     std::uint8_t byte = 0;
@@ -44,8 +147,7 @@ class NativeDevice : public NativeTest {
 
 TEST_F(NativeDevice, OpensItsPipesAndClosesThemInReverse) {
     Open().reset();
-    Lines transcript = driver_.TakeTranscript();
-    EXPECT_THAT(transcript,
+    EXPECT_THAT(driver_.TakeTranscript(),
                 ElementsAre("open native/1", "open native/1\\PIPE01", "open native/1\\PIPE02",
                             "open native/1\\PIPE03", "read 3 [8]",
                             "control 220009 00 00 00 00 00 00 84 00 00 00 / 00 00 00 00 00 00 00 00",
@@ -72,9 +174,7 @@ TEST_F(NativeDevice, ThatCannotBeOpenedLeavesNothingBehind) {
         EXPECT_EQ(driver_.OpenFiles(), 0u);
         EXPECT_THAT(driver_.TakeTransfers(), IsEmpty());
     };
-    InstallCallFilter([](std::string_view call) {
-        return call == "StartThread" ? Errors::NoSystemResources : Errors::Success;
-    });
+    FailCalls("StartThread");
     expectFailure("could not create interrupt listener thread");
     InstallCallFilter({});
     driver_.RefuseOpen(Path + "\\PIPE03", Errors::FileNotFound);
@@ -93,15 +193,28 @@ TEST_F(NativeDevice, ClosesItsPipesWhenTheInstrumentIsGone) {
     EXPECT_THAT(listener_.Codes(), ElementsAre(MessageDeviceGone));
     EXPECT_THAT(driver_.TakeTranscript(), ElementsAre("close native/1\\PIPE02", "close native/1\\PIPE01",
                                                       "close native/1", "close native/1\\PIPE03"));
-    const std::string suffix = ErrorSuffix(Errors::InvalidHandle);
-    ExpectThrow<IOException>("read data failed" + suffix, [&] { ReadOneByte(*device); });
-    ExpectThrow<TimeoutException>("Device IO control failed " + suffix,
-                                  [&] { device->PerformDeviceIOControl({}, nullptr, 0); });
-    ScanRecordList records;
-    ExpectThrow<IOException>("Read data failed (OverlappedRead)",
-                             [&] { device->ReadDataStrip(records, 5, 0); });
+    ExpectThrow<IOException>("read data failed" + ErrorSuffix(Errors::InvalidHandle),
+                             [&] { ReadOneByte(*device); });
     device.reset();
     EXPECT_THAT(driver_.TakeTranscript(), IsEmpty());
+}
+
+/// A message that came while the device could not be made does not reach the listener that gets none.
+TEST_F(NativeDevice, DropsTheMessagesOfADeviceThatCouldNotBeOpened) {
+    driver_.Script(InterruptPipe, ButtonData);
+    InstallCallFilter([waits = 0, opener = std::this_thread::get_id()](std::string_view call) mutable {
+        // The second wait: the first one is for the device lock.
+        if (call != "Wait" || std::this_thread::get_id() != opener || ++waits != 2) {
+            return Errors::Success;
+        }
+        SleepMilliseconds(10);  // the message waits for the lock
+        return Errors::InvalidHandle;
+    });
+    ExpectThrow<IOException>("interrupt listener thread had timeout",
+                             [&] { PellandoUSBDevice device(&listener_, Path); });
+    InstallCallFilter({});
+    EXPECT_EQ(driver_.OpenFiles(), 0u);
+    EXPECT_THAT(listener_.Codes(), IsEmpty());
 }
 
 /// Whoever holds the mutex named after the path keeps every transfer of every device of that path waiting.
@@ -171,42 +284,27 @@ TEST_F(NativeDevice, MayBeUsedAndClosedFromInsideAMessage) {
 
 /// Closing is bounded even if somebody holds the device lock and the listener's thread waits for it; that
 /// thread then finds everything it touches in place, and its message is dropped.
-TEST_F(NativeDevice, ClosesInTimeWhileAMessageWaitsForTheDeviceLock) {
-    const OwnedHandle release(MakeAutoResetEvent());
-    std::atomic<bool> isHeld = false;
-    auto device = Open();
-    BackgroundThread holder([&] {
-        Mutex mutex("native1");
-        const ScopedLock held(mutex);
-        isHeld = true;
-        Wait(release.Get(), Infinite);
-    });
-    WaitUntil([&] { return isHeld.load(); });
-    driver_.Complete(InterruptPipe, ButtonData);
-    SleepMilliseconds(10);  // the message waits for the lock
-    const Stopwatch watch(clock_);
-    device.reset();
-    watch.ExpectAtMost(11'000u);
-    EXPECT_EQ(driver_.OpenFiles(), 0u);
-    SignalEvent(release.Get());
-    holder.Join();
-    SleepMilliseconds(10);
-    EXPECT_THAT(listener_.Codes(), IsEmpty());
-}
-
-TEST_F(NativeDevice, ClosesAtOnceWhileSomebodyHoldsTheDeviceLock) {
-    auto device = Open();
-    driver_.TakeTranscript();
-    Mutex mutex("native1");
-    const ScopedLock held(mutex);
-    const Stopwatch watch(clock_);
-    BackgroundThread closer([&] { device.reset(); });
-    WaitUntil([&] { return closer.HasEnded(); });
-    watch.ExpectAtMost(5);
-    EXPECT_THAT(
-        driver_.TakeTransfers(),
-        ElementsAre("control 220009 00 00 00 00 00 00 84 00 00 00 / 00 00 00 00 00 00 00 00",
-                    "control 220011 00 02 00 00 D0 00 03 00 00 00 / 00 00 00 00 00 00 00 00", "cancel 3"));
+TEST_F(NativeDevice, ClosesInTimeWhileSomebodyHoldsTheDeviceLock) {
+    for (const bool messageWaits : {false, true}) {
+        auto device = Open();
+        driver_.TakeTranscript();
+        {
+            Mutex mutex("native1");
+            const ScopedLock held(mutex);
+            if (messageWaits) {
+                driver_.Complete(InterruptPipe, ButtonData);
+                SleepMilliseconds(10);
+            }
+            const Stopwatch watch(clock_);
+            BackgroundThread closer([&] { device.reset(); });
+            WaitUntil([&] { return closer.HasEnded(); });
+            watch.ExpectAtMost(messageWaits ? 11'001 : 5);
+            EXPECT_EQ(driver_.OpenFiles(), 0u);
+            EXPECT_THAT(driver_.TakeTransfers(), testing::SizeIs(messageWaits ? 0 : 3)) << "as ever";
+        }
+        SleepMilliseconds(10);
+        EXPECT_THAT(listener_.Codes(), IsEmpty());
+    }
 }
 
 TEST(NativeDeviceName, KeepsLettersAndDigits) {
