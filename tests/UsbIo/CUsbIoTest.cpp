@@ -163,14 +163,7 @@ TEST_F(CUsbIoTest, SendsTheDriversRecords) {
     EXPECT_THAT(parameters.words, ElementsAre(0x11, 0x22));
     EXPECT_EQ(device.SetDeviceParameters({{0x01020304, 0x05060708}}), 0U);
 
-    ClassOrVendorRequest request;
-    request.flags = 0x01020304;
-    request.type = 2;
-    request.recipient = 0x0A0B0C0D;
-    request.reservedBits = 0x55;
-    request.request = 0xC0;
-    request.value = 0x1234;
-    request.index = 0x5678;
+    const ClassOrVendorRequest request{0x01020304, 2, 0x0A0B0C0D, 0x55, 0xC0, 0x1234, 0x5678};
     std::array<std::uint8_t, 3> data{1, 2, 3};
     std::uint32_t length = data.size();
     EXPECT_EQ(device.ClassOrVendorOutRequest(data.data(), length, request), 0U);
@@ -210,12 +203,9 @@ TEST_F(CUsbIoTest, SendsTheDriversRecords) {
 TEST_F(CUsbIoTest, ControlsOfSeveralThreadsRunOneAtATime) {
     CUsbIo device;
     ASSERT_EQ(Open(device), Status::Success);
-    constexpr int Each = 5;
-    for (int i = 0; i < 2 * Each; ++i) {
-        driver_.Script(Control::UnconfigureDevice, {.after = 2});
-    }
     const auto work = [&] {
-        for (int i = 0; i < Each; ++i) {
+        for (int i = 0; i < 5; ++i) {
+            driver_.Script(Control::UnconfigureDevice, {.after = 2});
             EXPECT_EQ(device.UnconfigureDevice(), 0U);
         }
     };

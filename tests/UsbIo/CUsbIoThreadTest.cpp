@@ -1,6 +1,5 @@
 #include <algorithm>
 #include <atomic>
-#include <optional>
 
 #include "Protocol/Instrument.h"
 #include "Support/DriverTest.h"
@@ -146,37 +145,32 @@ TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
 }
 
 TEST_F(CUsbIoThreadTest, EndsAfterTooManyErrorsInARow) {
+    constexpr std::uint32_t Bad = Status::EndpointHalted, Down = Status::DevicePoweredDown;
     struct Case {
         const char* name;
         std::vector<std::uint32_t> statuses;  ///< of the transfers; the next one would fail, too
-        std::vector<std::uint32_t> errors;    ///< seen before the thread ends
-        std::optional<std::uint32_t> most = 2;
-    };
-    constexpr std::uint32_t Bad = Status::EndpointHalted;
-    constexpr std::uint32_t Down = Status::DevicePoweredDown;
-    const std::vector<Case> cases{
-        {"at once", {Bad, Bad, Bad}, {Bad, Bad, Bad}},
-        {"a good one starts anew", {Bad, Bad, 0, Bad, Bad, Bad}, {Bad, Bad, Bad, Bad, Bad}},
-        {"powered down does not count",
-         {Down, Down, Down, Down, Bad, Bad, Bad},
-         {Down, Down, Down, Down, Bad, Bad, Bad}},
-        {"three are not too many", {Bad, Bad, Bad, 0, Bad, Bad, Bad, Bad}, std::vector(7, Bad), {}},
+        std::uint32_t most = 2;
     };
     const auto run = [&](auto& stream, std::uint8_t endpoint, const Case& row) {
         SCOPED_TRACE(row.name);
         Bind(stream, endpoint);
+        auto errors = row.statuses;
+        std::erase(errors, Status::Success);
         for (const std::uint32_t status : row.statuses) {
             driver_.Script(endpoint, {.code = status, .after = 1});
         }
         driver_.Script(endpoint, {.code = Bad});
         ASSERT_TRUE(stream.AllocateBuffers(8, 1));
-        ASSERT_TRUE(row.most ? stream.StartThread(*row.most) : stream.StartThread());
+        ASSERT_TRUE(row.most == 3 ? stream.StartThread() : stream.StartThread(row.most));
         EXPECT_TRUE(stream.WaitForExit());
-        EXPECT_EQ(stream.Errors(), row.errors);
+        EXPECT_EQ(stream.Errors(), errors);
         EXPECT_TRUE(stream.ShutdownThread());
         driver_.DropScript(endpoint);
     };
-    for (const Case& row : cases) {
+    for (const Case& row :
+         {Case{"at once", {Bad, Bad, Bad}}, Case{"a good one starts anew", {Bad, Bad, 0, Bad, Bad, Bad}},
+          Case{"powered down does not count", {Down, Down, Down, Down, Bad, Bad, Bad}},
+          Case{"three are not too many", {Bad, Bad, Bad, 0, Bad, Bad, Bad, Bad}, 3}}) {
         Reader reader;
         run(reader, BulkInEndpoint, row);
         Writer writer;
@@ -239,21 +233,18 @@ TEST_F(CUsbIoThreadTest, WritesUntilFinished) {
 TEST(CUsbIoBufferPool, HandsOutTheBufferPutBackLast) {
     CUsbIoBufferPool pool;
     EXPECT_FALSE(pool.Allocate(0xFFFFFFFF, 0xFFFFFFFF)) << "more than there can be";
-    EXPECT_EQ(pool.Get(), nullptr);
     ASSERT_TRUE(pool.Allocate(16, 2));
     EXPECT_FALSE(pool.Allocate(16, 2)) << "is in use";
-    CUsbIoBuffer* const first = pool.Get();
-    CUsbIoBuffer* const second = pool.Get();
+    CUsbIoBuffer *const first = pool.Get(), *const second = pool.Get();
     ASSERT_TRUE(first && second);
     EXPECT_EQ(pool.Get(), nullptr);
     EXPECT_EQ(static_cast<std::uint8_t*>(first->Buffer), static_cast<std::uint8_t*>(second->Buffer) + 16)
         << "one block of memory; the buffer behind all others comes first";
+    EXPECT_EQ(first->Size, 16U);
     pool.Put(first);
     pool.Put(second);
     EXPECT_EQ(pool.CurrentCount(), 2U);
     EXPECT_EQ(pool.Get(), second);
-    EXPECT_EQ(pool.Get(), first);
-    EXPECT_EQ(first->Size, 16U);
     pool.Free();
     EXPECT_EQ(pool.Get(), nullptr);
     EXPECT_EQ(pool.CurrentCount(), 0U);

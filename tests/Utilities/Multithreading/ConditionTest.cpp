@@ -35,11 +35,11 @@ void Elsewhere(std::function<void()> work) {
     BackgroundThread(std::move(work)).Join();
 }
 
-/// Whether another thread can have the lock at once; it gives it back.
-bool IsFree(SynchronizationObject& lock) {
+/// Whether another thread can have the lock, at once or so soon; it gives it back.
+bool IsFree(SynchronizationObject& lock, int milliseconds = 0) {
     bool acquired = false;
     Elsewhere([&] {
-        acquired = lock.TryLock(0);
+        acquired = lock.TryLock(milliseconds);
         if (acquired) {
             lock.Unlock();
         }
@@ -158,7 +158,7 @@ class ConditionTest : public Locks {
                     EXPECT_TRUE(condition_.Wait(0));
                 } catch (const ResourceException& exception) {
                     failure_ = exception.what();
-                    EXPECT_TRUE(IsFree(mutex_)) << "a wait that has failed holds nothing";
+                    EXPECT_TRUE(IsFree(mutex_, 1000)) << "a wait that has failed holds nothing";
                     mutex_.Lock();  // the scope's unlock finds nothing to unlock otherwise
                 }
                 --waiting_;
@@ -252,10 +252,7 @@ TEST_F(ConditionTest, AFailedWakeUnlocksTheMutexAndKeepsNothingLocked) {
         MakeFail(row.failing);
         ExpectThrow<ResourceException>(row.message, [&] { (condition_.*row.wake)(); });
         Platform::InstallCallFilter({});
-        Elsewhere([this] {
-            EXPECT_TRUE(mutex_.TryLock(1000)) << "must have been unlocked";
-            mutex_.Unlock();
-        });
+        EXPECT_TRUE(IsFree(mutex_, 1000)) << "must have been unlocked";
         ExpectWoken(row.woken);
     }
     StartWaiters(1);

@@ -199,24 +199,6 @@ TEST_F(NativeDevice, ClosesItsPipesWhenTheInstrumentIsGone) {
     EXPECT_THAT(driver_.TakeTranscript(), IsEmpty());
 }
 
-/// A message that came while the device could not be made does not reach the listener that gets none.
-TEST_F(NativeDevice, DropsTheMessagesOfADeviceThatCouldNotBeOpened) {
-    driver_.Script(InterruptPipe, ButtonData);
-    InstallCallFilter([waits = 0, opener = std::this_thread::get_id()](std::string_view call) mutable {
-        // The second wait: the first one is for the device lock.
-        if (call != "Wait" || std::this_thread::get_id() != opener || ++waits != 2) {
-            return Errors::Success;
-        }
-        SleepMilliseconds(10);  // the message waits for the lock
-        return Errors::InvalidHandle;
-    });
-    ExpectThrow<IOException>("interrupt listener thread had timeout",
-                             [&] { PellandoUSBDevice device(&listener_, Path); });
-    InstallCallFilter({});
-    EXPECT_EQ(driver_.OpenFiles(), 0u);
-    EXPECT_THAT(listener_.Codes(), IsEmpty());
-}
-
 /// Whoever holds the mutex named after the path keeps every transfer of every device of that path waiting.
 TEST_F(NativeDevice, TakesTheDeviceLockForEveryTransfer) {
     auto device = Open();
