@@ -70,6 +70,7 @@ function(ostra_test NAME)
   cmake_parse_arguments(ARG "WAITS_LONG" "" "SOURCES;LINK;EXACT_TIME" ${ARGN})
   ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest $<$<TARGET_EXISTS:ostra_virtual_time>:ostra_virtual_time>)
   target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
+  set_target_properties(${NAME} PROPERTIES UNITY_BUILD OFF)  # tests name their fixtures as they like
   if(OSTRA_SANITIZE)
     target_compile_options(${NAME} PRIVATE -O0)  # what is tested is optimised; its tests had better compile fast
   endif()

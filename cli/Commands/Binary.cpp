@@ -12,12 +12,12 @@ namespace {
 
 using namespace Service;
 
-struct GetOptions {
+struct GetBinaryOptions {
     MemoryOptions memory;
     NewFileOptions file;
 };
 
-void Get(Session& session, const GetOptions& options) {
+void GetBinary(Session& session, const GetBinaryOptions& options) {
     const NewFile file(session, options.file);
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
     const std::vector<std::uint8_t> block = BinaryBlockOf(target.Image());
@@ -30,13 +30,13 @@ void Get(Session& session, const GetOptions& options) {
     }
 }
 
-struct PutOptions {
+struct PutBinaryOptions {
     MemoryOptions memory;
     ChangeOptions change;
     std::string file;
 };
 
-void Put(Session& session, const PutOptions& options) {
+void PutBinary(Session& session, const PutBinaryOptions& options) {
     const std::vector<std::uint8_t> block =
         ReadFileOfSize(session, options.file, Protocol::EepromMap::BinarySize, "a binary block",
                        "`ostra binary get FILE` saves the one of an instrument");
@@ -51,18 +51,18 @@ void Put(Session& session, const PutOptions& options) {
 void AddBinary(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("binary", "read and write the binary block of 1904 bytes");
 
-    const auto get = std::make_shared<GetOptions>();
+    const auto get = std::make_shared<GetBinaryOptions>();
     CommandSpec command = group.AddCommand("get", "save the binary block in a file");
     AddNewFileOptions(command, "FILE", get->file);
     AddMemoryOptions(command, get->memory);
-    SetAction(command, session, get, Get);
+    SetAction(command, session, get, GetBinary);
 
-    const auto put = std::make_shared<PutOptions>();
+    const auto put = std::make_shared<PutBinaryOptions>();
     command = group.AddCommand("put", "write the binary block from a file");
     command.Add("FILE", put->file, "1904 bytes; `-` is standard input").Required();
     AddChangeOptions(command, put->change);
     AddMemoryOptions(command, put->memory);
-    SetAction(command, session, put, Put);
+    SetAction(command, session, put, PutBinary);
 }
 
 }  // namespace Varnholt::Cli

@@ -14,11 +14,11 @@ namespace {
 
 using namespace Service;
 
-struct ShowOptions {
+struct ShowCalibrationOptions {
     MemoryOptions memory;
 };
 
-void Show(Session& session, const ShowOptions& options) {
+void ShowCalibration(Session& session, const ShowCalibrationOptions& options) {
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
     ImageModel model = target.Interpret([](const EepromImage& image) { return ImageModel(image); });
     if (options.memory.json) {
@@ -28,13 +28,13 @@ void Show(Session& session, const ShowOptions& options) {
     }
 }
 
-struct SetOptions {
+struct SetCalibrationOptions {
     MemoryOptions memory;
     ChangeOptions change;
     std::vector<std::string> assignments;
 };
 
-void Set(Session& session, const SetOptions& options) {
+void SetCalibration(Session& session, const SetCalibrationOptions& options) {
     const std::vector<Assignment> assignments = ParseAssignments(options.assignments);
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     const EditedImage edited = target.Interpret(
@@ -58,12 +58,12 @@ void Set(Session& session, const SetOptions& options) {
 void AddCalibration(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("calibration", "show and set calibration values");
 
-    const auto show = std::make_shared<ShowOptions>();
+    const auto show = std::make_shared<ShowCalibrationOptions>();
     CommandSpec command = group.AddCommand("show", "show the calibration values");
     AddMemoryOptions(command, show->memory);
-    SetAction(command, session, show, Show);
+    SetAction(command, session, show, ShowCalibration);
 
-    const auto set = std::make_shared<SetOptions>();
+    const auto set = std::make_shared<SetCalibrationOptions>();
     command = group.AddCommand(
         "set",
         "set calibration values: the EEPROM is read, changed as a whole and proven, backed up, written "
@@ -71,7 +71,7 @@ void AddCalibration(CommandSpec app, Session& session) {
     command.Add("ID=VALUE", set->assignments, "new values; elements with commas: 1000=0.5,1.5").Required();
     AddChangeOptions(command, set->change);
     AddMemoryOptions(command, set->memory);
-    SetAction(command, session, set, Set);
+    SetAction(command, session, set, SetCalibration);
 }
 
 }  // namespace Varnholt::Cli

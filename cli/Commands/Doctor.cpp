@@ -9,7 +9,7 @@
 namespace Varnholt::Cli {
 namespace {
 
-struct Options {
+struct DoctorOptions {
     std::string transport;
     bool json = false;
 };
@@ -28,7 +28,7 @@ const char* NameOf(Finding::Level level) {
     return "";
 }
 
-void Doctor(Session& session, const Options& options) {
+void Doctor(Session& session, const DoctorOptions& options) {
     session.ChooseTransport(options.transport);
     const std::vector<Finding> findings = Diagnose(session.Context());
     Json list{Json::Array()};
@@ -60,7 +60,7 @@ void Doctor(Session& session, const Options& options) {
 }  // namespace
 
 void AddDoctor(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<Options>();
+    const auto options = std::make_shared<DoctorOptions>();
     CommandSpec command =
         app.AddCommand("doctor", "say why an instrument is not found or cannot be used, and what to do");
     command.Footer("Every instrument that is free is opened, and thereby reset, to see whether it answers.");

@@ -80,7 +80,7 @@ void PrintRawAreas(Session& session, const EepromImage& image) {
     }
 }
 
-void Show(Session& session, const ViewOptions& options) {
+void ShowEeprom(Session& session, const ViewOptions& options) {
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
     ImageModel model = target.Interpret([](const EepromImage& image) { return ImageModel(image); });
     const LogCopies copies = ReadLogCopies(target.Image());
@@ -242,7 +242,7 @@ void AddEepromViews(CommandSpec group, Session& session) {
     CommandSpec command = group.AddCommand("show", "show what is in an EEPROM or an image");
     command.AddFlag("--numbers", show->numbers, "show vectors as numbers, not as plots").Group("Output");
     AddMemoryOptions(command, show->memory, "FILE");
-    SetAction(command, session, show, Show);
+    SetAction(command, session, show, ShowEeprom);
 
     const auto check = std::make_shared<ViewOptions>();
     command = group.AddCommand(

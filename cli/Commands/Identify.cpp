@@ -9,12 +9,12 @@
 namespace Varnholt::Cli {
 namespace {
 
-struct Options {
+struct IdentifyOptions {
     InstrumentOptions instrument;
     bool json = false;
 };
 
-void Identify(Session& session, const Options& options) {
+void Identify(Session& session, const IdentifyOptions& options) {
     Service::OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options.instrument));
     const Service::Identity found = instrument.Identify();
     const std::string name = Service::ShortNameOf(instrument.Identifier());
@@ -52,7 +52,7 @@ void Identify(Session& session, const Options& options) {
 }  // namespace
 
 void AddIdentify(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<Options>();
+    const auto options = std::make_shared<IdentifyOptions>();
     CommandSpec command =
         app.AddCommand("identify",
                        "show what an instrument says of itself: chip id, MISC values, mode, "

@@ -9,14 +9,14 @@
 namespace Varnholt::Cli {
 namespace {
 
-struct Options {
+struct ListOptions {
     InstrumentOptions instrument;
     bool candidates = false;
     bool chipId = false;
     bool json = false;
 };
 
-void List(Session& session, const Options& options) {
+void List(Session& session, const ListOptions& options) {
     if (options.candidates) {
         PrintCandidates(session, options.json);
         return;
@@ -60,7 +60,7 @@ void List(Session& session, const Options& options) {
 }  // namespace
 
 void AddList(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<Options>();
+    const auto options = std::make_shared<ListOptions>();
     CommandSpec command = app.AddCommand("list", "list the instruments that are connected");
     AddTransportOption(command, options->instrument);
     command.AddFlag("--candidates", options->candidates,

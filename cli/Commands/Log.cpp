@@ -14,12 +14,12 @@ namespace {
 
 using namespace Service;
 
-struct ShowOptions {
+struct ShowLogOptions {
     MemoryOptions memory;
     bool numbers = false;
 };
 
-void Show(Session& session, const ShowOptions& options) {
+void ShowLog(Session& session, const ShowLogOptions& options) {
     const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
     ImageModel model = target.Interpret([](const EepromImage& image) { return ImageModel(image); });
     const LogCopies copies = ReadLogCopies(target.Image());
@@ -38,12 +38,12 @@ void Show(Session& session, const ShowOptions& options) {
     PrintValues(session, model.Log(), options.numbers ? Vectors::Numbers : Vectors::Plotted);
 }
 
-struct ResetOptions {
+struct ResetLogOptions {
     MemoryOptions memory;
     ChangeOptions change;
 };
 
-void Reset(Session& session, const ResetOptions& options) {
+void ResetLog(Session& session, const ResetLogOptions& options) {
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     const EepromImage empty = target.Interpret(WithEmptyLog);
     const MemoryTarget::Outcome outcome = target.Change(empty, options.change, Granularity::Elements);
@@ -58,17 +58,17 @@ void Reset(Session& session, const ResetOptions& options) {
 void AddLog(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("log", "show and reset the usage log");
 
-    const auto show = std::make_shared<ShowOptions>();
+    const auto show = std::make_shared<ShowLogOptions>();
     CommandSpec command = group.AddCommand("show", "show the usage log");
     command.AddFlag("--numbers", show->numbers, "show vectors as numbers, not as plots").Group("Output");
     AddMemoryOptions(command, show->memory);
-    SetAction(command, session, show, Show);
+    SetAction(command, session, show, ShowLog);
 
-    const auto reset = std::make_shared<ResetOptions>();
+    const auto reset = std::make_shared<ResetLogOptions>();
     command = group.AddCommand("reset", "empty both copies of the usage log");
     AddChangeOptions(command, reset->change);
     AddMemoryOptions(command, reset->memory);
-    SetAction(command, session, reset, Reset);
+    SetAction(command, session, reset, ResetLog);
 }
 
 }  // namespace Varnholt::Cli

@@ -8,7 +8,7 @@
 namespace Varnholt::Cli {
 namespace {
 
-struct Options {
+struct MonitorOptions {
     InstrumentOptions instrument;
     double seconds = 0;
     bool json = false;
@@ -37,7 +37,7 @@ void Print(Session& session, const Service::InstrumentEvent& event, bool asJson)
     session.FlushOut();
 }
 
-void Monitor(Session& session, const Options& options) {
+void Monitor(Session& session, const MonitorOptions& options) {
     Service::EventWatch watch(session.Context(), ChooseInstrument(session, options.instrument));
     session.Note("watching " + watch.Identifier() + "; Ctrl-C ends");
     for (;;) {
@@ -57,7 +57,7 @@ void Monitor(Session& session, const Options& options) {
 }  // namespace
 
 void AddMonitor(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<Options>();
+    const auto options = std::make_shared<MonitorOptions>();
     CommandSpec command = app.AddCommand(
         "monitor", "print a line each time that the button is pressed, and when the instrument is removed");
     command.Add("--for", options->seconds, "end after this many seconds (default: with Ctrl-C)")

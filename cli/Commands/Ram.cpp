@@ -15,7 +15,7 @@ namespace {
 
 using namespace Service;
 
-struct ShowOptions {
+struct ShowRamOptions {
     InstrumentOptions instrument;
     bool json = false;
 };
@@ -28,7 +28,7 @@ void PrintSet(Session& session, const RamAccess::Properties& set) {
     table.Print(session.Out());
 }
 
-void Show(Session& session, const ShowOptions& options) {
+void ShowRam(Session& session, const ShowRamOptions& options) {
     OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options.instrument));
     const auto set =
         instrument.Do([](const OpenedInstrument::Commands& commands) { return RamAccess(commands).Load(); });
@@ -39,14 +39,14 @@ void Show(Session& session, const ShowOptions& options) {
     }
 }
 
-struct SetOptions {
+struct SetRamOptions {
     InstrumentOptions instrument;
     std::vector<std::string> assignments;
     bool dryRun = false;
     bool json = false;
 };
 
-void Set(Session& session, const SetOptions& options) {
+void SetRam(Session& session, const SetRamOptions& options) {
     const std::vector<Assignment> assignments = ParseAssignments(options.assignments);
     OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options.instrument));
     RamAccess::Properties before, set;
@@ -84,13 +84,13 @@ void Set(Session& session, const SetOptions& options) {
 void AddRam(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("ram", "show and set volatile parameters of an instrument");
 
-    const auto show = std::make_shared<ShowOptions>();
+    const auto show = std::make_shared<ShowRamOptions>();
     CommandSpec command = group.AddCommand("show", "show the volatile parameters");
     AddInstrumentOptions(command, show->instrument);
     AddJsonFlag(command, show->json);
-    SetAction(command, session, show, Show);
+    SetAction(command, session, show, ShowRam);
 
-    const auto set = std::make_shared<SetOptions>();
+    const auto set = std::make_shared<SetRamOptions>();
     command = group.AddCommand(
         "set",
         "set measurement parameters; chooses the measurement mode that can count the integration time");
@@ -98,7 +98,7 @@ void AddRam(CommandSpec app, Session& session) {
     command.AddFlag("--dry-run", set->dryRun, "show what would be set and set nothing").Group("Change");
     AddInstrumentOptions(command, set->instrument);
     AddJsonFlag(command, set->json);
-    SetAction(command, session, set, Set);
+    SetAction(command, session, set, SetRam);
 }
 
 }  // namespace Varnholt::Cli

@@ -20,7 +20,7 @@ namespace {
 
 constexpr std::size_t ValuesInARow = 8;
 
-struct Options {
+struct ReadoutOptions {
     InstrumentOptions instrument;
     MeasurementOptions measurement;
     std::uint32_t repeat = 1;
@@ -56,12 +56,12 @@ std::string TableOf(const Values& values) {
     return text;
 }
 
-constexpr const char* Noun = "readout";
+constexpr const char* ReadoutNoun = "readout";
 
 /// Puts readouts into the form that the user asked for.
 class Formatter final {
   public:
-    Formatter(Session& usedSession, const Options& chosen, std::string identifier)
+    Formatter(Session& usedSession, const ReadoutOptions& chosen, std::string identifier)
         : session_(usedSession),
           options_(chosen),
           instrument_(std::move(identifier)),
@@ -129,7 +129,7 @@ class Formatter final {
     }
 
     Session& session_;
-    const Options& options_;
+    const ReadoutOptions& options_;
     const std::string instrument_;
     const bool isDrawnOver_;
     LiveBlock block_;
@@ -146,9 +146,9 @@ Readout Take(Service::OpenedInstrument& instrument, std::uint32_t number, std::u
 }
 
 /// Takes readouts until there are enough, or until the user ends what has no other end.
-void TakeSeries(Session& session, Service::OpenedInstrument& instrument, const Options& options,
+void TakeSeries(Session& session, Service::OpenedInstrument& instrument, const ReadoutOptions& options,
                 Formatter& formatter, RecordOutput& output, Service::ElapsedTime& time) {
-    const auto progress = session.StartProgress("taking", options.repeat, std::string(Noun) + "s");
+    const auto progress = session.StartProgress("taking", options.repeat, std::string(ReadoutNoun) + "s");
     const auto interval = static_cast<std::uint64_t>(options.interval * 1000);
     for (std::uint32_t taken = 0; options.repeat == 0 || taken < options.repeat; ++taken) {
         Readout readout{};
@@ -171,7 +171,7 @@ void TakeSeries(Session& session, Service::OpenedInstrument& instrument, const O
     }
 }
 
-void TakeInto(RecordOutput& output, Session& session, const Options& options) {
+void TakeInto(RecordOutput& output, Session& session, const ReadoutOptions& options) {
     Service::OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options.instrument));
     const Service::MeasurementSettings settings = options.measurement.Settings();
     Formatter formatter(session, options, instrument.Identifier());
@@ -183,17 +183,17 @@ void TakeInto(RecordOutput& output, Session& session, const Options& options) {
     TakeSeries(session, instrument, options, formatter, output, time);
     output.Complete();
     if (GoesToFile(options.output)) {
-        session.Note(fmt::format("{} in {:.3f} s, written to {}", CountText(output.Records(), Noun),
+        session.Note(fmt::format("{} in {:.3f} s, written to {}", CountText(output.Records(), ReadoutNoun),
                                  static_cast<double>(time.Milliseconds()) / 1000, options.output));
     }
 }
 
-void TakeReadouts(Session& session, const Options& options) {
+void TakeReadouts(Session& session, const ReadoutOptions& options) {
     const auto output = MakeRecordOutput(session, options.output, options.raw);
     try {
         TakeInto(*output, session, options);
     } catch (...) {
-        const Failure failure = EndEarly(session, *output, Noun, false).failure;
+        const Failure failure = EndEarly(session, *output, ReadoutNoun, false).failure;
         // The user's wish is the only end that it has.
         if (options.repeat != 0 || failure.Kind() != FailureKind::Interrupted || output->Records() > 0) {
             throw Failure(failure);
@@ -208,7 +208,7 @@ void TakeReadouts(Session& session, const Options& options) {
 }  // namespace
 
 void AddReadout(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<Options>();
+    const auto options = std::make_shared<ReadoutOptions>();
     CommandSpec command = app.AddCommand("readout", "take readouts of 128 values");
     command.Add("-n,--repeat", options->repeat, "readouts to take, 0: until Ctrl-C (default: 1)").Type("N");
     command.Add("-i,--interval", options->interval, "seconds from one readout to the next")

@@ -19,7 +19,7 @@ namespace {
 
 using namespace Service;
 
-struct Options {
+struct RegisterOptions {
     std::string id;
     std::string file = UdevRuleFile;
     bool remove = false;
@@ -40,7 +40,7 @@ std::string RulesIn(const std::string& file) {
     return {std::istreambuf_iterator<char>(stream), {}};
 }
 
-void ChangeRules(const Options& options, const std::string& rules) {
+void ChangeRules(const RegisterOptions& options, const std::string& rules) {
     if (rules.empty()) {
         std::error_code error;
         std::filesystem::remove(options.file, error);
@@ -68,7 +68,7 @@ void ApplyRules(Session& session) {
 }
 
 /// udev passes over a group that it does not know.
-void WarnOfMissingGroup(Session& session, const Options& options) {
+void WarnOfMissingGroup(Session& session, const RegisterOptions& options) {
     if (getgrnam(InstrumentGroup) == nullptr) {
         session.Warn(fmt::format(
             "there is no group {0}, so only the user at the seat has access; for others: sudo groupadd "
@@ -77,7 +77,7 @@ void WarnOfMissingGroup(Session& session, const Options& options) {
     }
 }
 
-void Register(Session& session, const Options& options) {
+void Register(Session& session, const RegisterOptions& options) {
     const UsbId id = ParseUsbId(options.id);
     const std::string before = RulesIn(options.file);
     const RulesLeft left = WithoutRule(before, id);
@@ -124,7 +124,7 @@ void Register(Session& session, const Options& options) {
 }  // namespace
 
 void AddRegister(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<Options>();
+    const auto options = std::make_shared<RegisterOptions>();
     CommandSpec command = app.AddCommand(
         "register", "make a kind of USB device known as an instrument (writes a udev rule; as root)");
     command.Add("VID:PID", options->id, "vendor and product number; `ostra list --candidates` shows them")

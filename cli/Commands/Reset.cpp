@@ -7,13 +7,13 @@
 namespace Varnholt::Cli {
 namespace {
 
-struct Options {
+struct ResetInstrumentOptions {
     InstrumentOptions instrument;
     std::uint16_t code = Protocol::OpeningResetCode;
     bool json = false;
 };
 
-void Reset(Session& session, const Options& options) {
+void ResetInstrument(Session& session, const ResetInstrumentOptions& options) {
     Service::OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options.instrument));
     instrument.Reset(options.code);
     if (options.json) {
@@ -26,7 +26,7 @@ void Reset(Session& session, const Options& options) {
 }  // namespace
 
 void AddReset(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<Options>();
+    const auto options = std::make_shared<ResetInstrumentOptions>();
     CommandSpec command = app.AddCommand("reset", "reset an instrument");
     command
         .Add("--code", options->code, "reset code, one byte (default: 31, the one that every opening sends)")
@@ -34,7 +34,7 @@ void AddReset(CommandSpec app, Session& session) {
         .Between(0, 255);
     AddInstrumentOptions(command, options->instrument);
     AddJsonFlag(command, options->json);
-    SetAction(command, session, options, Reset);
+    SetAction(command, session, options, ResetInstrument);
 }
 
 }  // namespace Varnholt::Cli

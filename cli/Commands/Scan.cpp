@@ -14,9 +14,9 @@
 namespace Varnholt::Cli {
 namespace {
 
-constexpr const char* Noun = "record";
+constexpr const char* RecordNoun = "record";
 
-struct Options {
+struct ScanOptions {
     InstrumentOptions instrument;
     MeasurementOptions measurement;
     std::uint32_t recordSize = Protocol::ReadoutBytes;
@@ -36,7 +36,7 @@ struct Ending {
     double seconds = 0;
 };
 
-std::uint32_t TotalOf(const Options& options, Service::Context::Transport transport) {
+std::uint32_t TotalOf(const ScanOptions& options, Service::Context::Transport transport) {
     const std::uint64_t total =
         options.records > 0 ? std::uint64_t{options.records} * options.recordSize : options.total;
     if (total > 0xFFFFFFFF) {
@@ -72,7 +72,7 @@ const char* NameOf(ExitCode code) {
     }
 }
 
-void PrintSummary(Session& session, const Options& options, const std::string& identifier,
+void PrintSummary(Session& session, const ScanOptions& options, const std::string& identifier,
                   const RecordOutput& output, const Ending& ending, const std::string& file) {
     session.Print({{"identifier", identifier},
                    {"records", output.Records()},
@@ -85,7 +85,7 @@ void PrintSummary(Session& session, const Options& options, const std::string& i
 
 /// Scans into the output and completes it. `ending` is kept up to date, for whoever catches a failure.
 void ScanInto(RecordOutput& output, Session& session, Service::OpenedInstrument& instrument,
-              const Options& options, std::uint32_t total, Ending& ending) {
+              const ScanOptions& options, std::uint32_t total, Ending& ending) {
     PrepareMeasurement(instrument, options.measurement.Settings());
     Service::ElapsedTime time;
     Service::ScanReport report;
@@ -113,7 +113,7 @@ void ScanInto(RecordOutput& output, Session& session, Service::OpenedInstrument&
     note();
 }
 
-void CheckForm(const Options& options) {
+void CheckForm(const ScanOptions& options) {
     if (options.json && !GoesToFile(options.output)) {
         throw Failure(FailureKind::BadArgument, "--json prints on standard output, and the records go there",
                       "write them to a file: --output FILE");
@@ -124,7 +124,7 @@ void CheckForm(const Options& options) {
     }
 }
 
-void Scan(Session& session, const Options& options) {
+void Scan(Session& session, const ScanOptions& options) {
     session.ChooseTransport(options.instrument.transport);
     const std::uint32_t total = TotalOf(options, session.Context().UsedTransport());
     CheckForm(options);
@@ -137,7 +137,7 @@ void Scan(Session& session, const Options& options) {
         identifier = instrument.Identifier();
         ScanInto(*output, session, instrument, options, total, ending);
     } catch (...) {
-        const EarlyEnd end = EndEarly(session, *output, Noun, options.discard);
+        const EarlyEnd end = EndEarly(session, *output, RecordNoun, options.discard);
         if (options.json && !identifier.empty()) {
             ending.how = ending.isShort ? "short" : NameOf(ExitCodeOf(end.failure.Kind()));
             PrintSummary(session, options, identifier, *output, ending, end.file);
@@ -148,7 +148,7 @@ void Scan(Session& session, const Options& options) {
         PrintSummary(session, options, identifier, *output, ending, options.output);
     } else {
         const double rate = ending.seconds > 0 ? static_cast<double>(ending.received) / ending.seconds : 0;
-        session.Note(fmt::format("{} of {} bytes in {:.3f} s{}{}", CountText(output->Records(), Noun),
+        session.Note(fmt::format("{} of {} bytes in {:.3f} s{}{}", CountText(output->Records(), RecordNoun),
                                  options.recordSize, ending.seconds,
                                  rate > 0 ? ", " + SizeText(rate) + "/s" : "",
                                  GoesToFile(options.output) ? ", written to " + options.output : ""));
@@ -158,7 +158,7 @@ void Scan(Session& session, const Options& options) {
 }  // namespace
 
 void AddScan(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<Options>();
+    const auto options = std::make_shared<ScanOptions>();
     CommandSpec command = app.AddCommand(
         "scan", "stream records: a fixed number of them, or until the instrument stops; Ctrl-C ends it");
     command

@@ -16,12 +16,12 @@ namespace {
 
 using namespace Service;
 
-struct GetOptions {
+struct GetWordOptions {
     MemoryOptions memory;
     std::vector<std::uint16_t> ids;
 };
 
-void Get(Session& session, const GetOptions& options) {
+void GetWord(Session& session, const GetWordOptions& options) {
     std::vector<std::uint16_t> ids = options.ids;
     if (ids.empty()) {
         for (std::uint16_t id = Protocol::PropertyIds::FirstRawWord; id <= LastWritableRawWord; ++id) {
@@ -43,13 +43,13 @@ void Get(Session& session, const GetOptions& options) {
     }
 }
 
-struct PutOptions {
+struct PutWordOptions {
     MemoryOptions memory;
     ChangeOptions change;
     std::vector<std::string> assignments;
 };
 
-void Put(Session& session, const PutOptions& options) {
+void PutWord(Session& session, const PutWordOptions& options) {
     struct Word {
         std::uint16_t id;
         std::uint32_t value;
@@ -86,18 +86,18 @@ void Put(Session& session, const PutOptions& options) {
 void AddWord(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("word", "read and write raw words of the EEPROM, 4 bytes each");
 
-    const auto get = std::make_shared<GetOptions>();
+    const auto get = std::make_shared<GetWordOptions>();
     CommandSpec command = group.AddCommand("get", "show raw words");
     command.Add("ID", get->ids, "10200 to 10239 (default: 10200 to 10215; those behind are the table's)");
     AddMemoryOptions(command, get->memory);
-    SetAction(command, session, get, Get);
+    SetAction(command, session, get, GetWord);
 
-    const auto put = std::make_shared<PutOptions>();
+    const auto put = std::make_shared<PutWordOptions>();
     command = group.AddCommand("put", "write raw words");
     command.Add("ID=VALUE", put->assignments, "words 10200 to 10215, decimal or 0x...").Required();
     AddChangeOptions(command, put->change);
     AddMemoryOptions(command, put->memory);
-    SetAction(command, session, put, Put);
+    SetAction(command, session, put, PutWord);
 }
 
 }  // namespace Varnholt::Cli

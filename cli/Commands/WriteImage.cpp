@@ -10,13 +10,13 @@
 namespace Varnholt::Cli {
 namespace {
 
-struct Options {
+struct WriteImageOptions {
     InstrumentOptions instrument;
     std::string file;
     bool json = false;
 };
 
-void WriteImage(Session& session, const Options& options) {
+void WriteImage(Session& session, const WriteImageOptions& options) {
     const Service::EepromImage image = ReadImageFile(session, options.file);
     Service::OpenedInstrument instrument(session.Context(),
                                          ChooseInstrument(session, options.instrument, Choice::MustBeNamed));
@@ -38,7 +38,7 @@ void WriteImage(Session& session, const Options& options) {
 }  // namespace
 
 void AddWriteImage(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<Options>();
+    const auto options = std::make_shared<WriteImageOptions>();
     CommandSpec command =
         app.AddCommand("write-image",
                        "write the whole of an EEPROM image, whatever is in it, as the "

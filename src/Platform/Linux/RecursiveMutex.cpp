@@ -12,25 +12,21 @@ namespace Varnholt::Platform {
 
 using namespace Linux;
 
-namespace {
-
-class LockingCall final : public BlockedCall {
-  public:
-    LockingCall(ThreadRecord& caller, std::uint32_t ownersNumber)
-        : BlockedCall(caller), owner_(ownersNumber) {}
-    std::string Describe() const override { return "a mutex owned by thread " + std::to_string(owner_); }
-
-    LockingCall* next = nullptr;
-
-  private:
-    const std::uint32_t owner_;
-};
-
-}  // namespace
-
 /// The mutex's own lock, and not the dispatcher lock, keeps the threads apart: a tool that looks for data
 /// races then sees exactly the order that the mutex makes.
 struct RecursiveMutex::Impl {
+    class LockingCall final : public BlockedCall {
+      public:
+        LockingCall(ThreadRecord& caller, std::uint32_t ownersNumber)
+            : BlockedCall(caller), owner_(ownersNumber) {}
+        std::string Describe() const override { return "a mutex owned by thread " + std::to_string(owner_); }
+
+        LockingCall* next = nullptr;
+
+      private:
+        const std::uint32_t owner_;
+    };
+
     std::mutex lock;
     std::atomic<const ThreadRecord*> owner = nullptr;
     unsigned depth = 0;  // of the owner only
