@@ -23,50 +23,50 @@ void FlipBit(std::uint8_t* data, std::size_t length, std::uint32_t bit) {
 
 }  // namespace
 
-void DataFaults::ReplaceOut(Passage& passage) {
-    Bytes& data = passage.replacedData;
-    data.assign(passage.data, passage.data + passage.length);
-    if (passage.Has(FaultKind::Garbage)) {
+void DataFaults::ReplaceOut(FaultyTransfer& transfer) {
+    Bytes& data = transfer.replacedData;
+    data.assign(transfer.data, transfer.data + transfer.length);
+    if (transfer.Has(FaultKind::Garbage)) {
         FillWithGarbage(data.data(), data.size(), script_.Hits());
-    } else if (passage.Has(FaultKind::Flip)) {
-        FlipBit(data.data(), data.size(), passage.fault->argument.value_or(0));
+    } else if (transfer.Has(FaultKind::Flip)) {
+        FlipBit(data.data(), data.size(), transfer.fault->argument.value_or(0));
     } else {
         const std::lock_guard lock(mutex_);
-        data = lastData_[{passage.endpoint, false}];
-        data.resize(passage.length);
+        data = lastData_[{transfer.endpoint, false}];
+        data.resize(transfer.length);
     }
-    passage.data = data.data();
+    transfer.data = data.data();
 }
 
-void DataFaults::KeepOut(const Passage& passage) {
+void DataFaults::KeepOut(const FaultyTransfer& transfer) {
     if (keepsData_) {
         const std::lock_guard lock(mutex_);
-        lastData_[{passage.endpoint, false}].assign(passage.data, passage.data + passage.length);
+        lastData_[{transfer.endpoint, false}].assign(transfer.data, transfer.data + transfer.length);
     }
 }
 
-std::optional<std::uint32_t> DataFaults::RepeatIn(Passage& passage) {
+std::optional<std::uint32_t> DataFaults::RepeatIn(FaultyTransfer& transfer) {
     const std::lock_guard lock(mutex_);
-    const auto last = lastData_.find({passage.endpoint, true});
+    const auto last = lastData_.find({transfer.endpoint, true});
     if (last == lastData_.end()) {
         return std::nullopt;
     }
     const auto length =
-        static_cast<std::uint32_t>(std::min<std::size_t>(passage.length, last->second.size()));
-    std::copy_n(last->second.begin(), length, passage.data);
+        static_cast<std::uint32_t>(std::min<std::size_t>(transfer.length, last->second.size()));
+    std::copy_n(last->second.begin(), length, transfer.data);
     return length;
 }
 
-void DataFaults::ChangeIn(Passage& passage) {
-    if (passage.Has(FaultKind::Garbage)) {
-        FillWithGarbage(passage.data, passage.actualLength, script_.Hits());
-    } else if (passage.Has(FaultKind::Flip)) {
-        FlipBit(passage.data, passage.actualLength, passage.fault->argument.value_or(0));
+void DataFaults::ChangeIn(FaultyTransfer& transfer) {
+    if (transfer.Has(FaultKind::Garbage)) {
+        FillWithGarbage(transfer.data, transfer.actualLength, script_.Hits());
+    } else if (transfer.Has(FaultKind::Flip)) {
+        FlipBit(transfer.data, transfer.actualLength, transfer.fault->argument.value_or(0));
     }
     if (keepsData_) {
         try {
             const std::lock_guard lock(mutex_);
-            lastData_[{passage.endpoint, true}].assign(passage.data, passage.data + passage.actualLength);
+            lastData_[{transfer.endpoint, true}].assign(transfer.data, transfer.data + transfer.actualLength);
         } catch (const std::bad_alloc&) {  // older data are as stale
         }
     }

@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "FaultPlan.h"
-#include "Passage.h"
+#include "FaultyTransfer.h"
 
 namespace Varnholt::Simulator {
 
@@ -21,15 +21,15 @@ class DataFaults final {
         : script_(faultScript), keepsData_(script_.Plan().Uses(FaultKind::Stale)) {}
 
     /// Gives a transfer out the wrong data in place of its own.
-    void ReplaceOut(Passage& passage);
+    void ReplaceOut(FaultyTransfer& transfer);
     /// Remembers what a transfer takes out.
-    void KeepOut(const Passage& passage);
+    void KeepOut(const FaultyTransfer& transfer);
 
     /// Fills in the data of the transfer before and answers how many bytes they are; nothing when there are
     /// none to repeat.
-    std::optional<std::uint32_t> RepeatIn(Passage& passage);
+    std::optional<std::uint32_t> RepeatIn(FaultyTransfer& transfer);
     /// Spoils what a transfer has brought in, and remembers it.
-    void ChangeIn(Passage& passage);
+    void ChangeIn(FaultyTransfer& transfer);
 
   private:
     using Bytes = std::vector<std::uint8_t>;

@@ -3,20 +3,17 @@
 #include <algorithm>
 #include <map>
 #include <mutex>
-#include <new>
 #include <set>
 #include <utility>
-#include <vector>
 
 #include "DataFaults.h"
-#include "Passage.h"
+#include "FaultyTransfer.h"
 
 namespace Varnholt::Simulator {
 
+using Capture::InterceptedTransfer;
 using Platform::ErrorCode;
-using Platform::Usb::EndpointInfo;
 using Platform::Usb::Transfer;
-using Platform::Usb::TransferClient;
 using Platform::Usb::TransferStatus;
 using Platform::Usb::UsbDevice;
 namespace Errors = Platform::Errors;
@@ -32,77 +29,80 @@ bool IsStandardRequest(const Transfer& transfer) {
     return transfer.endpoint == 0 && (transfer.setup.requestType & typeMask) == 0;
 }
 
-void Shorten(Passage& passage, std::uint32_t length) {
-    passage.length = std::min(passage.length, length);
-    if (passage.endpoint == 0) {
-        passage.setup.length = static_cast<std::uint16_t>(passage.length);
+/// The endpoint that a standard request frees of its halt; 0 for every other transfer.
+std::uint8_t ClearedEndpoint(const Transfer& transfer) {
+    constexpr std::uint8_t standardRequestToEndpoint = 0x02;
+    constexpr std::uint8_t clearFeature = 1;
+    const bool clears = transfer.endpoint == 0 && transfer.setup.requestType == standardRequestToEndpoint &&
+                        transfer.setup.request == clearFeature;
+    return clears ? static_cast<std::uint8_t>(transfer.setup.index) : std::uint8_t{0};
+}
+
+void Shorten(FaultyTransfer& transfer, std::uint32_t length) {
+    transfer.length = std::min(transfer.length, length);
+    if (transfer.endpoint == 0) {
+        transfer.setup.length = static_cast<std::uint16_t>(transfer.length);
     }
 }
 
-class FaultInjector final : public UsbDevice, private TransferClient {
+class FaultInjector final : public Capture::InterceptingDevice {
   public:
     FaultInjector(std::shared_ptr<UsbDevice> behind, std::shared_ptr<FaultScript> faultScript,
                   Platform::EventScheduler& eventScheduler, std::function<void()> unplugDevice)
-        : device_(std::move(behind)),
+        : InterceptingDevice(std::move(behind)),
           script_(std::move(faultScript)),
           scheduler_(eventScheduler),
           unplug_(std::move(unplugDevice)),
           dataFaults_(*script_) {}
     ~FaultInjector() override;
 
-    std::vector<EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
-        return device_->Endpoints(error);
-    }
-    ErrorCode Claim() override { return Gone() ? Errors::DeviceNotConnected : device_->Claim(); }
-    void Release() override { device_->Release(); }
-    ErrorCode Submit(Transfer& transfer) override;
-    void Cancel(Transfer& transfer) override;
+    ErrorCode Claim() override { return Gone() ? Errors::DeviceNotConnected : InterceptingDevice::Claim(); }
     ErrorCode ClearHalt(std::uint8_t endpoint) override;
 
   private:
     using EventId = Platform::EventScheduler::EventId;
+    using TransferPointer = std::shared_ptr<FaultyTransfer>;
 
-    ErrorCode Begin(const PassagePointer& passage);
-    ErrorCode PassOn(const PassagePointer& passage);
-    bool AnswerWithLastData(const PassagePointer& passage);
-    void HoldFor(const PassagePointer& passage, std::uint32_t milliseconds);
-    void TimeHasCome(const PassagePointer& passage) noexcept;
-    ErrorCode GoOn(const PassagePointer& passage) noexcept;
-    void TransferCompleted(Transfer& transfer) noexcept override;
-    void ChangeOutcome(Passage& passage);
-    void UnplugDevice();
-    void EndAll(TransferStatus status);
+    CopyPointer NewCopy() override { return std::make_shared<FaultyTransfer>(); }
+    ErrorCode Start(const CopyPointer& copy) override;
+    void Completed(InterceptedTransfer& copy) noexcept override;
 
-    /// Takes a transfer out of the ones under way; null when it has ended already.
-    PassagePointer TakeOut(const Passage& passage);
-    /// Ends a transfer unless it has ended already.
-    void End(const Passage& passage, TransferStatus status, std::uint32_t actualLength);
+    ErrorCode Begin(const TransferPointer& transfer);
+    /// With the fault that it has; an outcome comes at once, later, or from the device.
+    ErrorCode BeginWithFault(const TransferPointer& transfer);
+    ErrorCode Forward(const TransferPointer& transfer);
+    ErrorCode AnswerWithLastData(const TransferPointer& transfer);
+    ErrorCode EndWith(const FaultyTransfer& transfer, TransferStatus status);
+    /// False when the transfer's end was asked for meanwhile, and it has ended.
+    bool Hold(FaultyTransfer& transfer);
+    void HoldFor(const TransferPointer& transfer, std::uint32_t milliseconds);
+    void ForgetAlarm(const FaultyTransfer& transfer);
+    void TimeHasCome(const TransferPointer& transfer) noexcept;
+    void ChangeOutcome(FaultyTransfer& transfer);
+    void UnplugDevice(const FaultyTransfer* except = nullptr);
     bool Gone();
 
-    std::shared_ptr<UsbDevice> device_;
     const std::shared_ptr<FaultScript> script_;
     Platform::EventScheduler& scheduler_;
     const std::function<void()> unplug_;
     DataFaults dataFaults_;
 
-    std::mutex mutex_;  // guards what follows; not held while the device, a client or the scheduler is called
-    std::map<const Transfer*, PassagePointer> passages_;  // under way, by the submitter's own
-    std::map<const Passage*, EventId> alarms_;
+    std::mutex mutex_;  // guards what follows; not held while another object is called
+    std::map<const FaultyTransfer*, EventId> alarms_;
     std::set<std::uint8_t> halted_;
     bool gone_ = false;
 };
 
 FaultInjector::~FaultInjector() {
-    std::map<const Passage*, EventId> waiting;
+    std::map<const FaultyTransfer*, EventId> waiting;
     {
         const std::lock_guard lock(mutex_);
         waiting.swap(alarms_);
     }
-    for (const auto& [passage, alarm] : waiting) {
+    for (const auto& [transfer, alarm] : waiting) {
         scheduler_.Forget(alarm);
     }
-    EndAll(TransferStatus::Cancelled);
-    device_.reset();  // returns when what it still had has completed
+    Detach();
 }
 
 bool FaultInjector::Gone() {
@@ -110,222 +110,168 @@ bool FaultInjector::Gone() {
     return gone_;
 }
 
-ErrorCode FaultInjector::Submit(Transfer& transfer) try {
-    const auto passage = std::make_shared<Passage>();
-    static_cast<Transfer&>(*passage) = transfer;
-    passage->client = this;
-    passage->deviceData = nullptr;
-    passage->original = &transfer;
+ErrorCode FaultInjector::Start(const CopyPointer& copy) {
+    const auto transfer = std::static_pointer_cast<FaultyTransfer>(copy);
     {
         const std::lock_guard lock(mutex_);
         if (gone_) {
             return Errors::DeviceNotConnected;
         }
-        passages_[&transfer] = passage;
-        if (!IsStandardRequest(transfer)) {
-            passage->fault = script_->Next(transfer.endpoint);
+        if (!IsStandardRequest(*transfer)) {
+            transfer->fault = script_->Next(transfer->endpoint);
         }
-        if (passage->Has(FaultKind::Stall) && transfer.endpoint != 0) {
-            halted_.insert(transfer.endpoint);
-        } else if (halted_.contains(transfer.endpoint)) {
-            passage->fault = Fault{};
-            passage->fault->kind = FaultKind::Stall;
+        if (transfer->Has(FaultKind::Stall) && transfer->endpoint != 0) {
+            halted_.insert(transfer->endpoint);
+        } else if (halted_.contains(transfer->endpoint)) {
+            transfer->fault = Fault{};
+            transfer->fault->kind = FaultKind::Stall;
         }
     }
-    const ErrorCode code = GoOn(passage);
-    if (code != Errors::Success && !TakeOut(*passage)) {
-        return Errors::Success;  // cancelled meanwhile
-    }
-    return code;
-} catch (const std::bad_alloc&) {
-    return Errors::NotEnoughMemory;
+    return Begin(transfer);
 }
 
-/// With any code but `Success` the passage is still under way, and the caller's to end.
-ErrorCode FaultInjector::GoOn(const PassagePointer& passage) noexcept try {
-    return passage->Has(FaultKind::Late) && passage->wasHeld ? PassOn(passage) : Begin(passage);
-} catch (const std::bad_alloc&) {
-    return Errors::NotEnoughMemory;
-} catch (...) {
-    return Errors::GeneralFailure;
-}
-
-ErrorCode FaultInjector::Begin(const PassagePointer& passage) {
-    if (!passage->fault) {
-        return PassOn(passage);
+ErrorCode FaultInjector::Begin(const TransferPointer& transfer) {
+    if (!transfer->fault || (transfer->wasHeld && transfer->Has(FaultKind::Late))) {
+        return Forward(transfer);
     }
-    const std::optional<std::uint32_t> argument = passage->fault->argument;
-    if (ScopeOfEndpoint(passage->endpoint) == FaultScope::Interrupt && !passage->Has(FaultKind::Late) &&
-        !passage->wasHeld) {
-        HoldFor(passage, InterruptInterval);
+    if (transfer->Has(FaultKind::Late)) {
+        HoldFor(transfer, transfer->fault->argument.value_or(0));
         return Errors::Success;
     }
-    switch (passage->fault->kind) {
+    if (ScopeOfEndpoint(transfer->endpoint) == FaultScope::Interrupt && !transfer->wasHeld) {
+        HoldFor(transfer, InterruptInterval);
+        return Errors::Success;
+    }
+    return BeginWithFault(transfer);
+}
+
+ErrorCode FaultInjector::BeginWithFault(const TransferPointer& transfer) {
+    switch (transfer->fault->kind) {
         case FaultKind::Stall:
-            End(*passage, TransferStatus::Stalled, 0);
-            return Errors::Success;
+            return EndWith(*transfer, TransferStatus::Stalled);
         case FaultKind::IoError:
-            End(*passage, TransferStatus::IoError, 0);
-            return Errors::Success;
+            return EndWith(*transfer, TransferStatus::IoError);
         case FaultKind::Overflow:
-            End(*passage, TransferStatus::Overflow, 0);
-            return Errors::Success;
+            return EndWith(*transfer, TransferStatus::Overflow);
         case FaultKind::Empty:
-            End(*passage, TransferStatus::Completed, 0);
-            return Errors::Success;
+            return EndWith(*transfer, TransferStatus::Completed);
         case FaultKind::Silent:
-            return Errors::Success;
-        case FaultKind::Late:
-            HoldFor(passage, argument.value_or(0));
+            Hold(*transfer);
             return Errors::Success;
         case FaultKind::Short:
-            Shorten(*passage, argument.value_or(passage->length / 2));
-            return PassOn(passage);
+            Shorten(*transfer, transfer->fault->argument.value_or(transfer->length / 2));
+            break;
         case FaultKind::Long:
-            if (!passage->IsIn()) {
-                End(*passage, TransferStatus::Overflow, 0);
-                return Errors::Success;
+            if (!transfer->IsIn()) {
+                return EndWith(*transfer, TransferStatus::Overflow);
             }
-            return PassOn(passage);
+            break;
         case FaultKind::Stale:
-            if (passage->IsIn()) {
-                return AnswerWithLastData(passage) ? Errors::Success : PassOn(passage);
-            }
-            dataFaults_.ReplaceOut(*passage);
-            return PassOn(passage);
         case FaultKind::Garbage:
         case FaultKind::Flip:
-            if (!passage->IsIn()) {
-                dataFaults_.ReplaceOut(*passage);
+            if (!transfer->IsIn()) {
+                dataFaults_.ReplaceOut(*transfer);
+            } else if (transfer->Has(FaultKind::Stale)) {
+                return AnswerWithLastData(transfer);
             }
-            return PassOn(passage);
-        case FaultKind::GoneBefore: {
-            const std::lock_guard lock(mutex_);
-            passage->cancelWanted = true;  // the unplugging leaves it to the caller
-        }
-            UnplugDevice();
+            break;
+        case FaultKind::GoneBefore:
+            UnplugDevice(transfer.get());  // this one is refused
             return Errors::DeviceNotConnected;
         case FaultKind::GoneDuring:
-            if (passage->endpoint != 0 && !passage->IsIn() && passage->length > 1) {
-                Shorten(*passage, passage->length / 2);
-                return PassOn(passage);
+            if (transfer->endpoint == 0 || transfer->IsIn() || transfer->length <= 1) {
+                UnplugDevice(transfer.get());
+                return EndWith(*transfer, TransferStatus::DeviceGone);
             }
-            UnplugDevice();
-            return Errors::Success;
+            Shorten(*transfer, transfer->length / 2);
+            break;
+        case FaultKind::Late:
         case FaultKind::LateCancel:
         case FaultKind::GoneAfter:
             break;
     }
-    return PassOn(passage);
+    return Forward(transfer);
 }
 
-ErrorCode FaultInjector::PassOn(const PassagePointer& passage) {
-    constexpr std::uint8_t standardRequestToEndpoint = 0x02;
-    constexpr std::uint8_t clearFeature = 1;
-    {
+ErrorCode FaultInjector::Forward(const TransferPointer& transfer) {
+    if (!IsUnderWay(*transfer)) {
+        return Errors::Success;  // cancelled while it was held
+    }
+    if (!transfer->IsIn()) {
+        dataFaults_.KeepOut(*transfer);
+    }
+    if (const std::uint8_t endpoint = ClearedEndpoint(*transfer); endpoint != 0) {
         const std::lock_guard lock(mutex_);
-        const auto found = passages_.find(passage->original);
-        if (found == passages_.end() || found->second != passage) {
-            return Errors::Success;  // cancelled while it was held
-        }
-        passage->state = Passage::State::Submitting;
-        if (!passage->IsIn()) {
-            dataFaults_.KeepOut(*passage);
-        }
-        if (passage->endpoint == 0 && passage->setup.requestType == standardRequestToEndpoint &&
-            passage->setup.request == clearFeature) {
-            halted_.erase(static_cast<std::uint8_t>(passage->setup.index));
-        }
+        halted_.erase(endpoint);
     }
-    if (const ErrorCode code = device_->Submit(*passage); code != Errors::Success) {
-        return code;
+    return PassOn(transfer);
+}
+
+ErrorCode FaultInjector::AnswerWithLastData(const TransferPointer& transfer) {
+    const std::optional<std::uint32_t> length = dataFaults_.RepeatIn(*transfer);
+    if (!length) {
+        return Forward(transfer);  // there are none to repeat
     }
-    {
-        const std::lock_guard lock(mutex_);
-        if (passage->state != Passage::State::Submitting) {
-            return Errors::Success;
-        }
-        passage->state = Passage::State::InDevice;
-        if (!passage->cancelWanted) {
-            return Errors::Success;
-        }
-    }
-    device_->Cancel(*passage);
+    End(*transfer, TransferStatus::Completed, *length);
     return Errors::Success;
 }
 
-/// False when there are none to repeat.
-bool FaultInjector::AnswerWithLastData(const PassagePointer& passage) {
-    const std::optional<std::uint32_t> length = dataFaults_.RepeatIn(*passage);
-    if (!length) {
-        return false;
-    }
-    End(*passage, TransferStatus::Completed, *length);
-    return true;
+ErrorCode FaultInjector::EndWith(const FaultyTransfer& transfer, TransferStatus status) {
+    End(transfer, status, 0);
+    return Errors::Success;
 }
 
-void FaultInjector::HoldFor(const PassagePointer& passage, std::uint32_t milliseconds) {
-    passage->wasHeld = true;
+bool FaultInjector::Hold(FaultyTransfer& transfer) {
+    const bool holds = HoldBack(transfer, InterceptedTransfer::State::Held);
+    if (!holds) {
+        End(transfer, Gone() ? TransferStatus::DeviceGone : TransferStatus::Cancelled, 0);
+    }
+    return holds;
+}
+
+void FaultInjector::HoldFor(const TransferPointer& transfer, std::uint32_t milliseconds) {
+    transfer->wasHeld = true;
     {
         const std::lock_guard lock(mutex_);
-        alarms_[passage.get()] = 0;  // first what can fail: no alarm is left that nobody knows
+        alarms_[transfer.get()] = 0;  // first what can fail: no alarm is left that nobody knows
     }
     EventId alarm = 0;
     try {
+        if (!Hold(*transfer)) {
+            ForgetAlarm(*transfer);
+            return;
+        }
         alarm = scheduler_.CallAt(scheduler_.Now() + std::uint64_t{milliseconds} * 1000,
-                                  [this, passage] { TimeHasCome(passage); });
+                                  [this, transfer] { TimeHasCome(transfer); });
     } catch (...) {
-        const std::lock_guard lock(mutex_);
-        alarms_.erase(passage.get());
+        ForgetAlarm(*transfer);
         throw;
     }
     const std::lock_guard lock(mutex_);
-    if (const auto found = alarms_.find(passage.get()); found != alarms_.end()) {
+    if (const auto found = alarms_.find(transfer.get()); found != alarms_.end()) {
         found->second = alarm;
     }
 }
 
-void FaultInjector::TimeHasCome(const PassagePointer& passage) noexcept {
-    bool waiting = false;
-    {
-        const std::lock_guard lock(mutex_);
-        const auto found = passages_.find(passage->original);
-        waiting = found != passages_.end() && found->second == passage;
-    }
-    if (waiting) {
-        const ErrorCode code = GoOn(passage);
+void FaultInjector::ForgetAlarm(const FaultyTransfer& transfer) {
+    const std::lock_guard lock(mutex_);
+    alarms_.erase(&transfer);
+}
+
+void FaultInjector::TimeHasCome(const TransferPointer& transfer) noexcept {
+    if (IsUnderWay(*transfer)) {
+        ErrorCode code = Errors::Success;
+        try {
+            code = Begin(transfer);
+        } catch (...) {  // no memory
+            code = Errors::NotEnoughMemory;
+        }
         if (code != Errors::Success) {
-            End(*passage,
+            End(*transfer,
                 code == Errors::DeviceNotConnected ? TransferStatus::DeviceGone : TransferStatus::IoError, 0);
         }
     }
-    // Known as waiting until now, so that the destructor waits for the end of this call.
-    const std::lock_guard lock(mutex_);
-    alarms_.erase(passage.get());
-}
-
-void FaultInjector::Cancel(Transfer& transfer) {
-    PassagePointer passage;
-    bool held = false;
-    {
-        const std::lock_guard lock(mutex_);
-        const auto found = passages_.find(&transfer);
-        if (found == passages_.end()) {
-            return;
-        }
-        passage = found->second;
-        passage->cancelWanted = true;
-        if (passage->state == Passage::State::Submitting) {
-            return;
-        }
-        held = passage->state != Passage::State::InDevice;
-    }
-    if (held) {
-        End(*passage, TransferStatus::Cancelled,
-            passage->state == Passage::State::HeldWithData ? passage->actualLength : 0);
-    } else {
-        device_->Cancel(*passage);
-    }
+    ForgetAlarm(*transfer);  // known until now, so that the destructor waits for the end of this call
 }
 
 ErrorCode FaultInjector::ClearHalt(std::uint8_t endpoint) {
@@ -336,44 +282,38 @@ ErrorCode FaultInjector::ClearHalt(std::uint8_t endpoint) {
         }
         halted_.erase(endpoint);
     }
-    return device_->ClearHalt(endpoint);
+    return InterceptingDevice::ClearHalt(endpoint);
 }
 
-void FaultInjector::TransferCompleted(Transfer& transfer) noexcept {
-    auto& passage = static_cast<Passage&>(transfer);
-    const bool unplugs = passage.Has(FaultKind::GoneDuring) || passage.Has(FaultKind::GoneAfter);
-    bool held = false;
-    {
-        const std::lock_guard lock(mutex_);
-        held = passage.Has(FaultKind::LateCancel) && !passage.cancelWanted && !gone_ &&
-               passage.status == TransferStatus::Completed;
-        passage.state = held ? Passage::State::HeldWithData : Passage::State::InDevice;
-        if (!held) {
-            ChangeOutcome(passage);
-        }
+void FaultInjector::Completed(InterceptedTransfer& copy) noexcept {
+    auto& transfer = static_cast<FaultyTransfer&>(copy);
+    if (transfer.Has(FaultKind::LateCancel) && transfer.status == TransferStatus::Completed && !Gone() &&
+        HoldBack(transfer, InterceptedTransfer::State::HeldWithData)) {
+        return;
     }
-    if (!held) {
-        End(passage, passage.status, passage.actualLength);
-    }
+    const bool unplugs = transfer.Has(FaultKind::GoneDuring) || transfer.Has(FaultKind::GoneAfter);
+    ChangeOutcome(transfer);
+    End(transfer, transfer.status, transfer.actualLength);
     if (unplugs) {
         UnplugDevice();
     }
 }
 
-void FaultInjector::ChangeOutcome(Passage& passage) {
-    if (gone_ || passage.Has(FaultKind::GoneDuring)) {
-        passage.status = TransferStatus::DeviceGone;
-    } else if (passage.Has(FaultKind::LateCancel) && passage.status == TransferStatus::Completed) {
-        passage.status = TransferStatus::Cancelled;
-    } else if (passage.Has(FaultKind::Long) && passage.status == TransferStatus::Completed) {
-        passage.status = TransferStatus::Overflow;
+void FaultInjector::ChangeOutcome(FaultyTransfer& transfer) {
+    if (Gone() || transfer.Has(FaultKind::GoneDuring)) {
+        transfer.status = TransferStatus::DeviceGone;
+    } else if (transfer.Has(FaultKind::LateCancel) && transfer.status == TransferStatus::Completed) {
+        transfer.status = TransferStatus::Cancelled;
+    } else if (transfer.Has(FaultKind::Long) && transfer.status == TransferStatus::Completed) {
+        transfer.status = TransferStatus::Overflow;
     }
-    if (passage.IsIn()) {
-        dataFaults_.ChangeIn(passage);
+    if (transfer.IsIn()) {
+        dataFaults_.ChangeIn(transfer);
     }
 }
 
-void FaultInjector::UnplugDevice() {
+/// `except`, which may be null, is the caller's to end.
+void FaultInjector::UnplugDevice(const FaultyTransfer* except) {
     {
         const std::lock_guard lock(mutex_);
         if (std::exchange(gone_, true)) {
@@ -383,56 +323,7 @@ void FaultInjector::UnplugDevice() {
     if (unplug_) {
         unplug_();
     }
-    EndAll(TransferStatus::DeviceGone);
-}
-
-/// Ends what is held with `status` and has the device end the rest. One at a time: this takes no memory.
-void FaultInjector::EndAll(TransferStatus status) {
-    while (true) {
-        PassagePointer passage;
-        Passage::State state{};
-        {
-            const std::lock_guard lock(mutex_);
-            const auto found = std::ranges::find_if(
-                passages_, [](const auto& underWay) { return !underWay.second->cancelWanted; });
-            if (found == passages_.end()) {
-                return;
-            }
-            passage = found->second;
-            passage->cancelWanted = true;
-            state = passage->state;
-        }
-        if (state == Passage::State::InDevice) {
-            device_->Cancel(*passage);
-        } else if (state != Passage::State::Submitting) {
-            const bool keepsData =
-                status == TransferStatus::Cancelled && state == Passage::State::HeldWithData;
-            End(*passage, status, keepsData ? passage->actualLength : 0);
-        }
-    }
-}
-
-PassagePointer FaultInjector::TakeOut(const Passage& passage) {
-    const std::lock_guard lock(mutex_);
-    const auto found = passages_.find(passage.original);
-    if (found == passages_.end() || found->second.get() != &passage) {
-        return nullptr;
-    }
-    PassagePointer taken = std::move(found->second);
-    passages_.erase(found);
-    return taken;
-}
-
-void FaultInjector::End(const Passage& passage, TransferStatus status, std::uint32_t actualLength) {
-    // Keeps the copy alive for the device that is completing it.
-    const PassagePointer taken = TakeOut(passage);
-    if (!taken) {
-        return;
-    }
-    Transfer& original = *taken->original;
-    original.status = status;
-    original.actualLength = actualLength;
-    original.client->TransferCompleted(original);
+    EndAll(TransferStatus::DeviceGone, except);
 }
 
 }  // namespace

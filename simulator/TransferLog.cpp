@@ -40,16 +40,20 @@ class LoggedDevice final : public Capture::InterceptingDevice {
     ~LoggedDevice() override { Detach(); }
 
   private:
-    void BeforeSubmit(std::uint64_t, Transfer&) override {}
-    void AfterCompletion(std::uint64_t, Transfer& transfer) noexcept override {
-        std::string line = Describe(transfer);
-        if (transfer.status != TransferStatus::Completed) {
-            line += ": " + ToText(transfer.status);
+    Platform::ErrorCode Start(const CopyPointer& copy) override {
+        const Platform::ErrorCode code = PassOn(copy);
+        if (code != Platform::Errors::Success) {
+            log_(Describe(*copy) + ": refused with code " + std::to_string(code));
+        }
+        return code;
+    }
+    void Completed(Capture::InterceptedTransfer& copy) noexcept override {
+        std::string line = Describe(copy);
+        if (copy.status != TransferStatus::Completed) {
+            line += ": " + ToText(copy.status);
         }
         log_(line);
-    }
-    void Refused(std::uint64_t, Transfer& transfer, Platform::ErrorCode code) override {
-        log_(Describe(transfer) + ": refused with code " + std::to_string(code));
+        InterceptingDevice::Completed(copy);
     }
 
     const Log log_;

@@ -4,11 +4,13 @@
 #include <map>
 #include <utility>
 
+#include "Capture/DescribeRequest.h"
 #include "Capture/InterceptingDevice.h"
 #include "Protocol/Instrument.h"
 
 namespace Varnholt::Simulator {
 
+using Capture::Hexadecimal;
 using Capture::InterceptingDevice;
 using Platform::Usb::Transfer;
 using Platform::Usb::TransferStatus;
@@ -16,15 +18,10 @@ using Platform::Usb::UsbDevice;
 
 namespace {
 
-std::string Hexadecimal(std::uint8_t byte) {
-    constexpr const char* digits = "0123456789ABCDEF";
-    return {digits[byte >> 4], digits[byte & 0xF]};
-}
-
 std::string EndpointText(const RecordedTransfer& transfer) {
     switch (transfer.endpoint) {
         case 0:
-            return "control " + Hexadecimal(transfer.setup.request) +
+            return "control " + Hexadecimal(transfer.setup.request, 2) +
                    (transfer.setup.IsIn() ? " in " : " out ");
         case Protocol::BulkInEndpoint:
             return "bulk-in ";
@@ -33,7 +30,7 @@ std::string EndpointText(const RecordedTransfer& transfer) {
         case Protocol::InterruptInEndpoint:
             return "interrupt ";
         default:
-            return "endpoint " + Hexadecimal(transfer.endpoint) + " ";
+            return "endpoint " + Hexadecimal(transfer.endpoint, 2) + " ";
     }
 }
 
@@ -60,7 +57,7 @@ std::string ToText(TransferStatus status) {
 std::string RecordedTransfer::Text(std::size_t most) const {
     std::string text = EndpointText(*this) + std::to_string(length) + ":";
     for (std::size_t i = 0; i < std::min(most, data.size()); ++i) {
-        text += " " + Hexadecimal(data[i]);
+        text += " " + Hexadecimal(data[i], 2);
     }
     if (data.size() > most) {
         text += " ...";
@@ -87,39 +84,45 @@ class TransferRecorder::Device final : public InterceptingDevice {
         std::size_t index;
     };
 
-    void BeforeSubmit(std::uint64_t id, Transfer& transfer) override {
+    Platform::ErrorCode Start(const CopyPointer& copy) override {
         RecordedTransfer recorded;
-        recorded.endpoint = transfer.endpoint;
-        recorded.setup = transfer.setup;
-        recorded.length = transfer.length;
-        if (!transfer.IsIn()) {
-            recorded.data.assign(transfer.data, transfer.data + transfer.length);
+        recorded.endpoint = copy->endpoint;
+        recorded.setup = copy->setup;
+        recorded.length = copy->length;
+        if (!copy->IsIn()) {
+            recorded.data.assign(copy->data, copy->data + copy->length);
         }
-        const std::lock_guard lock(recorder_.mutex_);
-        places_[id] = {recorder_.cleared_, recorder_.transfers_.size()};
-        recorder_.transfers_.push_back(std::move(recorded));
-    }
-
-    void AfterCompletion(std::uint64_t id, Transfer& transfer) noexcept override {
-        const std::lock_guard lock(recorder_.mutex_);
-        if (RecordedTransfer* const recorded = Find(id)) {
-            recorded->completed = true;
-            recorded->status = transfer.status;
-            if (transfer.IsIn()) {
-                recorded->data.assign(transfer.data, transfer.data + transfer.actualLength);
-            } else {
-                recorded->data.resize(std::min<std::size_t>(recorded->data.size(), transfer.actualLength));
+        {
+            const std::lock_guard lock(recorder_.mutex_);
+            places_[copy->id] = {recorder_.cleared_, recorder_.transfers_.size()};
+            recorder_.transfers_.push_back(std::move(recorded));
+        }
+        const Platform::ErrorCode code = PassOn(copy);
+        if (code != Platform::Errors::Success) {
+            const std::lock_guard lock(recorder_.mutex_);
+            if (RecordedTransfer* const refused = Find(copy->id)) {
+                refused->accepted = false;
             }
+            places_.erase(copy->id);
         }
-        places_.erase(id);
+        return code;
     }
 
-    void Refused(std::uint64_t id, Transfer&, Platform::ErrorCode) override {
-        const std::lock_guard lock(recorder_.mutex_);
-        if (RecordedTransfer* const recorded = Find(id)) {
-            recorded->accepted = false;
+    void Completed(Capture::InterceptedTransfer& copy) noexcept override {
+        {
+            const std::lock_guard lock(recorder_.mutex_);
+            if (RecordedTransfer* const recorded = Find(copy.id)) {
+                recorded->completed = true;
+                recorded->status = copy.status;
+                if (copy.IsIn()) {
+                    recorded->data.assign(copy.data, copy.data + copy.actualLength);
+                } else {
+                    recorded->data.resize(std::min<std::size_t>(recorded->data.size(), copy.actualLength));
+                }
+            }
+            places_.erase(copy.id);
         }
-        places_.erase(id);
+        InterceptingDevice::Completed(copy);
     }
 
     RecordedTransfer* Find(std::uint64_t id) {

@@ -59,15 +59,15 @@ std::uint32_t FieldValue(std::span<const std::uint8_t> data, const Field& field)
     return value;
 }
 
+}  // namespace
+
 std::string Hexadecimal(std::uint32_t value, int digits) {
-    std::string text = "0x";
+    std::string text;
     for (int digit = digits - 1; digit >= 0; --digit) {
         text += "0123456789ABCDEF"[value >> (4 * digit) & 0xF];
     }
     return text;
 }
-
-}  // namespace
 
 std::string DescribeRequest(std::uint8_t request, std::uint16_t value, std::span<const std::uint8_t> data) {
     for (const Description& description : Descriptions) {
@@ -81,11 +81,11 @@ std::string DescribeRequest(std::uint8_t request, std::uint16_t value, std::span
             }
         }
         if (description.request == Request::DownloadRamFirmware) {
-            text += " address=" + Hexadecimal(value, 4);
+            text += " address=0x" + Hexadecimal(value, 4);
         }
         return text;
     }
-    return "vendor request " + Hexadecimal(request, 2);
+    return "vendor request 0x" + Hexadecimal(request, 2);
 }
 
 }  // namespace Varnholt::Capture

@@ -11,4 +11,7 @@ namespace Varnholt::Capture {
 /// the instrument does not have reads "vendor request 0x99".
 std::string DescribeRequest(std::uint8_t request, std::uint16_t value, std::span<const std::uint8_t> data);
 
+/// So many upper-case digits, without a prefix.
+std::string Hexadecimal(std::uint32_t value, int digits);
+
 }  // namespace Varnholt::Capture

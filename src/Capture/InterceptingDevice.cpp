@@ -1,9 +1,17 @@
 #include "Capture/InterceptingDevice.h"
 
+#include <algorithm>
+#include <new>
+
 namespace Varnholt::Capture {
 
-Platform::ErrorCode InterceptingDevice::Submit(Usb::Transfer& transfer) {
-    const auto copy = std::make_shared<Copy>();
+using Platform::ErrorCode;
+using Usb::TransferStatus;
+using State = InterceptedTransfer::State;
+namespace Errors = Platform::Errors;
+
+ErrorCode InterceptingDevice::Submit(Usb::Transfer& transfer) try {
+    const CopyPointer copy = NewCopy();
     static_cast<Usb::Transfer&>(*copy) = transfer;
     copy->client = this;
     copy->deviceData = nullptr;
@@ -13,50 +21,150 @@ Platform::ErrorCode InterceptingDevice::Submit(Usb::Transfer& transfer) {
         copy->id = ++lastId_;
         running_[&transfer] = copy;
     }
-    const std::uint64_t id = copy->id;
-    Platform::ErrorCode code = Platform::Errors::Success;
+    ErrorCode code = Errors::Success;
     try {
-        BeforeSubmit(id, *copy);
-        code = device_->Submit(*copy);
-    } catch (...) {
-        Take(transfer);
-        throw;
+        code = Start(copy);
+    } catch (const std::bad_alloc&) {
+        code = Errors::NotEnoughMemory;
     }
-    if (code != Platform::Errors::Success) {
-        Take(transfer);
-        Refused(id, *copy, code);
+    if (code != Errors::Success && !Take(*copy)) {
+        return Errors::Success;  // cancelled meanwhile
     }
     return code;
+} catch (const std::bad_alloc&) {
+    return Errors::NotEnoughMemory;
+}
+
+ErrorCode InterceptingDevice::PassOn(const CopyPointer& copy) {
+    {
+        const std::lock_guard lock(mutex_);
+        const auto found = running_.find(copy->original);
+        const bool ends = copy->state == State::Held && copy->cancelWanted;
+        if (found == running_.end() || found->second != copy || ends) {
+            return Errors::Success;  // cancelled while it was held
+        }
+        copy->state = State::Submitting;
+    }
+    if (const ErrorCode code = device_->Submit(*copy); code != Errors::Success) {
+        return code;
+    }
+    {
+        const std::lock_guard lock(mutex_);
+        if (copy->state != State::Submitting) {
+            return Errors::Success;
+        }
+        copy->state = State::InDevice;
+        if (!copy->cancelWanted) {
+            return Errors::Success;
+        }
+    }
+    device_->Cancel(*copy);
+    return Errors::Success;
 }
 
 void InterceptingDevice::Cancel(Usb::Transfer& transfer) {
-    std::shared_ptr<Copy> copy;
+    CopyPointer copy;
+    State state{};
     {
         const std::lock_guard lock(mutex_);
-        if (const auto found = running_.find(&transfer); found != running_.end()) {
-            copy = found->second;
+        const auto found = running_.find(&transfer);
+        if (found == running_.end()) {
+            return;
         }
+        copy = found->second;
+        copy->cancelWanted = true;
+        state = copy->state;
     }
-    if (copy) {
-        device_->Cancel(*copy);
+    CancelIn(*copy, state, TransferStatus::Cancelled);
+}
+
+void InterceptingDevice::EndAll(TransferStatus status, const InterceptedTransfer* except) {
+    while (true) {  // one at a time: this takes no memory
+        CopyPointer copy;
+        State state{};
+        {
+            const std::lock_guard lock(mutex_);
+            const auto found = std::ranges::find_if(running_, [except](const auto& underWay) {
+                return !underWay.second->cancelWanted && underWay.second.get() != except;
+            });
+            if (found == running_.end()) {
+                return;
+            }
+            copy = found->second;
+            copy->cancelWanted = true;
+            state = copy->state;
+        }
+        CancelIn(*copy, state, status);
     }
 }
 
-std::shared_ptr<InterceptingDevice::Copy> InterceptingDevice::Take(Usb::Transfer& original) {
-    const std::lock_guard lock(mutex_);
-    const auto found = running_.find(&original);
-    std::shared_ptr<Copy> copy = std::move(found->second);
-    running_.erase(found);
-    return copy;
+void InterceptingDevice::CancelIn(InterceptedTransfer& copy, State state, TransferStatus status) {
+    switch (state) {
+        case State::Submitting:
+            break;  // whoever submits it looks at `cancelWanted` afterwards
+        case State::InDevice:
+            device_->Cancel(copy);
+            break;
+        case State::Held:
+            End(copy, status, 0);
+            break;
+        case State::HeldWithData:
+            End(copy, status, status == TransferStatus::Cancelled ? copy.actualLength : 0);
+            break;
+    }
 }
 
 void InterceptingDevice::TransferCompleted(Usb::Transfer& transfer) noexcept {
-    Usb::Transfer& original = *static_cast<Copy&>(transfer).original;
-    const std::shared_ptr<Copy> copy = Take(original);
-    AfterCompletion(copy->id, *copy);
-    original.status = copy->status;
-    original.actualLength = copy->actualLength;
+    auto& copy = static_cast<InterceptedTransfer&>(transfer);
+    {
+        const std::lock_guard lock(mutex_);
+        copy.state = State::InDevice;
+    }
+    Completed(copy);
+}
+
+bool InterceptingDevice::HoldBack(InterceptedTransfer& copy, State state) {
+    const std::lock_guard lock(mutex_);
+    if (copy.cancelWanted) {
+        return false;
+    }
+    copy.state = state;
+    return true;
+}
+
+bool InterceptingDevice::IsUnderWay(const InterceptedTransfer& copy) {
+    const std::lock_guard lock(mutex_);
+    const auto found = running_.find(copy.original);
+    return found != running_.end() && found->second.get() == &copy;
+}
+
+InterceptingDevice::CopyPointer InterceptingDevice::Take(const InterceptedTransfer& copy) {
+    const std::lock_guard lock(mutex_);
+    const auto found = running_.find(copy.original);
+    if (found == running_.end() || found->second.get() != &copy) {
+        return nullptr;
+    }
+    CopyPointer taken = std::move(found->second);
+    running_.erase(found);
+    return taken;
+}
+
+void InterceptingDevice::End(const InterceptedTransfer& copy, TransferStatus status,
+                             std::uint32_t actualLength) {
+    // Keeps the copy alive for the device that is completing it.
+    const CopyPointer taken = Take(copy);
+    if (!taken) {
+        return;
+    }
+    Usb::Transfer& original = *taken->original;
+    original.status = status;
+    original.actualLength = actualLength;
     original.client->TransferCompleted(original);
+}
+
+void InterceptingDevice::Detach() {
+    EndAll(TransferStatus::Cancelled);
+    device_.reset();  // returns when what it still had has completed
 }
 
 }  // namespace Varnholt::Capture

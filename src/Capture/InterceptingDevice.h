@@ -3,6 +3,8 @@
 #include <map>
 #include <memory>
 #include <mutex>
+#include <utility>
+#include <vector>
 
 #include "Platform/Usb/UsbDevice.h"
 
@@ -10,9 +12,24 @@ namespace Varnholt::Capture {
 
 namespace Usb = Platform::Usb;
 
+/// What the device behind works on in place of the submitter's own transfer.
+struct InterceptedTransfer : Usb::Transfer {
+    enum class State {
+        Submitting,    ///< being handed to the device
+        InDevice,      ///< accepted by the device
+        Held,          ///< not with the device
+        HeldWithData,  ///< done by the device, not yet the submitter's
+    };
+
+    std::uint64_t id = 0;  ///< counts up from 1
+    Usb::Transfer* original = nullptr;
+    State state = State::Submitting;  ///< this and the next: the intercepting device's own
+    bool cancelWanted = false;
+};
+
 /// Base of devices that stand in front of another and look at, or change, every transfer: recorders and fault
 /// injectors. Each transfer is submitted as a copy; what the copy comes back with reaches the submitter's
-/// own.
+/// own. A derived class calls `Detach` first in its destructor.
 class InterceptingDevice : public Usb::UsbDevice, private Usb::TransferClient {
   public:
     std::vector<Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
@@ -28,30 +45,42 @@ class InterceptingDevice : public Usb::UsbDevice, private Usb::TransferClient {
     void Cancel(Usb::Transfer& transfer) final;
 
   protected:
-    explicit InterceptingDevice(std::shared_ptr<Usb::UsbDevice> behind) : device_(std::move(behind)) {}
-    /// A derived class calls this first in its destructor: no transfer is under way, and none of the
-    /// functions below is called, after it.
-    void Detach() { device_.reset(); }
+    using CopyPointer = std::shared_ptr<InterceptedTransfer>;
 
-    /// Before the copy is submitted; may change it.
-    virtual void BeforeSubmit(std::uint64_t id, Usb::Transfer& transfer) = 0;
-    /// When the copy has completed, before the submitter learns of it; may change its outcome.
-    virtual void AfterCompletion(std::uint64_t id, Usb::Transfer& transfer) noexcept = 0;
-    /// When the device did not accept the copy.
-    virtual void Refused(std::uint64_t id, Usb::Transfer& transfer, Platform::ErrorCode code) = 0;
+    explicit InterceptingDevice(std::shared_ptr<Usb::UsbDevice> behind) : device_(std::move(behind)) {}
+
+    virtual CopyPointer NewCopy() { return std::make_shared<InterceptedTransfer>(); }
+    /// What to do with a submitted copy: pass it on at once, or end or pass it on later. With any code but
+    /// `Success` the transfer is not accepted. It may have been cancelled, and so have ended, meanwhile.
+    virtual Platform::ErrorCode Start(const CopyPointer& copy) { return PassOn(copy); }
+    /// The device has done with the copy, whose outcome may be changed: ends it, or holds it back.
+    virtual void Completed(InterceptedTransfer& copy) noexcept { End(copy, copy.status, copy.actualLength); }
+
+    /// Submits a copy to the device unless it has ended. With any code but `Success` the caller has to end
+    /// it.
+    Platform::ErrorCode PassOn(const CopyPointer& copy);
+    /// Keeps a copy, `Held` or `HeldWithData`, until it is cancelled, ended or passed on; false, and nothing
+    /// changed, when its end was asked for already.
+    bool HoldBack(InterceptedTransfer& copy, InterceptedTransfer::State state);
+    /// Ends a transfer unless it has ended.
+    void End(const InterceptedTransfer& copy, Usb::TransferStatus status, std::uint32_t actualLength);
+    /// Ends what is held with `status` and has the device end the rest. `except`, which may be null, goes on.
+    void EndAll(Usb::TransferStatus status, const InterceptedTransfer* except = nullptr);
+    bool IsUnderWay(const InterceptedTransfer& copy);
+    /// No transfer is under way, and no function of the derived class is called, when this has returned.
+    void Detach();
 
   private:
-    struct Copy : Usb::Transfer {
-        std::uint64_t id = 0;
-        Usb::Transfer* original = nullptr;
-    };
-
     void TransferCompleted(Usb::Transfer& transfer) noexcept final;
-    std::shared_ptr<Copy> Take(Usb::Transfer& original);
+    /// Cancels a copy that was in `state` when that was decided.
+    void CancelIn(InterceptedTransfer& copy, InterceptedTransfer::State state, Usb::TransferStatus status);
+    /// Takes a copy out of the ones under way; null when it has ended.
+    CopyPointer Take(const InterceptedTransfer& copy);
 
     std::shared_ptr<Usb::UsbDevice> device_;
-    std::mutex mutex_;  // guards what follows; not held while the device or a client is called
-    std::map<const Usb::Transfer*, std::shared_ptr<Copy>> running_;
+    std::mutex
+        mutex_;  // guards what follows; not held while the device, a client or a derived class is called
+    std::map<const Usb::Transfer*, CopyPointer> running_;  // by the submitter's own
     std::uint64_t lastId_ = 0;
 };
 

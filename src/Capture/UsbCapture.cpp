@@ -27,20 +27,24 @@ class CapturedDevice final : public InterceptingDevice {
     ~CapturedDevice() override { Detach(); }
 
   private:
-    void BeforeSubmit(std::uint64_t id, Usb::Transfer& transfer) override {
-        writer_.Write({id, false, deviceNumber_, &transfer, Comment(transfer, false)});
-    }
-    void AfterCompletion(std::uint64_t id, Usb::Transfer& transfer) noexcept override {
-        try {
-            writer_.Write({id, true, deviceNumber_, &transfer, Comment(transfer, true)});
-        } catch (...) {  // no memory for the packet: the traffic goes on unrecorded
+    Platform::ErrorCode Start(const CopyPointer& copy) override {
+        writer_.Write({copy->id, false, deviceNumber_, copy.get(), Comment(*copy, false)});
+        const Platform::ErrorCode code = PassOn(copy);
+        if (code != Platform::Errors::Success) {
+            copy->status = code == Platform::Errors::DeviceNotConnected ? Usb::TransferStatus::DeviceGone
+                                                                        : Usb::TransferStatus::IoError;
+            copy->actualLength = 0;
+            WriteCompletion(*copy);
         }
+        return code;
     }
-    void Refused(std::uint64_t id, Usb::Transfer& transfer, Platform::ErrorCode code) override {
-        transfer.status = code == Platform::Errors::DeviceNotConnected ? Usb::TransferStatus::DeviceGone
-                                                                       : Usb::TransferStatus::IoError;
-        transfer.actualLength = 0;
-        AfterCompletion(id, transfer);
+    void Completed(InterceptedTransfer& copy) noexcept override {
+        WriteCompletion(copy);
+        InterceptingDevice::Completed(copy);
+    }
+    void WriteCompletion(const InterceptedTransfer& copy) noexcept try {
+        writer_.Write({copy.id, true, deviceNumber_, &copy, Comment(copy, true)});
+    } catch (...) {  // no memory for the packet: the traffic goes on unrecorded
     }
 
     PcapngWriter& writer_;
