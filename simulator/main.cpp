@@ -79,85 +79,110 @@ int Attach(UsbIpServer& server, const std::string& name) {
     return ends[0];
 }
 
-void Run(const ProgramOptions& options) {
-    PollLoop loop;
-    const Log complain = [](const std::string& line) {
-        std::cerr << "ostra-simulator: " << line << std::endl;
-    };
-    const Log log = options.verbose ? complain : Log();
-    const std::vector<std::string> names = InstrumentNames(options);
-    if (options.eepromFiles.size() > names.size()) {
-        throw std::runtime_error("more --eeprom files than instruments");
+void Complain(const std::string& line) {
+    std::cerr << "ostra-simulator: " << line << std::endl;
+}
+
+/// The instruments of a program, with what they write to.
+class Instruments final {
+  public:
+    Instruments(PollLoop& pollLoop, const ProgramOptions& programOptions)
+        : loop_(pollLoop),
+          options_(programOptions),
+          names_(InstrumentNames(options_)),
+          server_(loop_, options_.verbose ? Log(Complain) : Log()) {
+        if (options_.eepromFiles.size() > names_.size()) {
+            throw std::runtime_error("more --eeprom files than instruments");
+        }
+        const FaultPlan faults = FaultPlan::Parse(options_.faults);
+        for (std::size_t i = 0; i < names_.size(); ++i) {
+            Add(i, faults);
+        }
     }
-    const FaultPlan faults = FaultPlan::Parse(options.faults);
-    std::optional<Varnholt::Capture::PcapngWriter>
-        capture;  // made last: nothing is emptied by a start that fails
-    std::vector<std::unique_ptr<EepromFile>> files;
-    UsbIpServer server(loop, log);
-    for (std::size_t i = 0; i < names.size(); ++i) {
-        InstrumentSettings settings = MakeSettings(options, i);
+
+    /// Makes them reachable, and says how.
+    void Offer() {
+        const std::uint16_t port = options_.tcpPort ? server_.ListenTcp(*options_.tcpPort) : 0;
+        std::vector<int> kernelSockets;
+        for (std::size_t i = 0; options_.attach && i < names_.size(); ++i) {
+            kernelSockets.push_back(Attach(server_, names_[i]));
+        }
+        if (!options_.captureFile.empty()) {  // made last: nothing is emptied by a start that fails
+            capture_.emplace(options_.captureFile, "ostra-simulator");
+            if (capture_->Failed()) {
+                throw std::runtime_error("cannot write " + options_.captureFile);
+            }
+        }
+        for (std::size_t i = 0; i < kernelSockets.size(); ++i) {
+            server_.Serve(kernelSockets[i], names_[i], Usb::KernelAsUser);
+        }
+        for (std::size_t i = 0; options_.tcpPort && i < names_.size(); ++i) {
+            std::cout << "ready: usbip --tcp-port " << port << " attach -r 127.0.0.1 -b "
+                      << server_.Record(names_[i]).busId << "  (" << names_[i] << ")\n";
+        }
+        for (const std::string& name : names_) {
+            std::cout << "ready: " << Usb::SimulatedPrefix << name << "\n";
+        }
+        std::cout << std::flush;
+    }
+
+    /// Completes what they write to.
+    void Finish() {
+        if (capture_ && capture_->Failed()) {
+            Complain(options_.captureFile + " is incomplete");
+        }
+        if (std::ranges::count_if(files_, [](const auto& file) { return !file->Finish(); }) > 0) {
+            throw std::runtime_error("what was written to the EEPROM is lost");
+        }
+    }
+
+  private:
+    void Add(std::size_t index, const FaultPlan& faults) {
+        InstrumentSettings settings = MakeSettings(options_, index);
         EepromFile* file = nullptr;
-        if (i < options.eepromFiles.size()) {
-            file = files.emplace_back(std::make_unique<EepromFile>(loop, options.eepromFiles[i], complain))
-                       .get();
+        if (index < options_.eepromFiles.size()) {
+            const std::string& path = options_.eepromFiles[index];
+            file = files_.emplace_back(std::make_unique<EepromFile>(loop_, path, Complain)).get();
             if (file->Exists()) {
-                settings.eeprom = ReadEepromFile(options.eepromFiles[i]);
+                settings.eeprom = ReadEepromFile(path);
             }
             settings.memoryChanged = [file] { file->MemoryChanged(); };
         }
-        const auto instrument = std::make_shared<SimulatedInstrument>(loop, std::move(settings));
-        UsbIpServer::Export exported{names[i], instrument, faults, {}};
-        if (!options.captureFile.empty()) {
-            const auto number = static_cast<std::uint8_t>(i + 1);
-            exported.wrap = [&capture, number](std::shared_ptr<Usb::UsbDevice> device) {
-                return Varnholt::Capture::CaptureDevice(std::move(device), *capture, number);
+        const auto instrument = std::make_shared<SimulatedInstrument>(loop_, std::move(settings));
+        UsbIpServer::Export exported{names_[index], instrument, faults, {}};
+        if (!options_.captureFile.empty()) {
+            const auto number = static_cast<std::uint8_t>(index + 1);
+            exported.wrap = [this, number](std::shared_ptr<Usb::UsbDevice> device) {
+                return Varnholt::Capture::CaptureDevice(std::move(device), *capture_, number);
             };
         }
-        server.Add(std::move(exported));
+        server_.Add(std::move(exported));
         if (file) {
             file->Keep(instrument);
         }
     }
-    const std::uint16_t port = options.tcpPort ? server.ListenTcp(*options.tcpPort) : 0;
-    std::vector<int> kernelSockets;
-    for (std::size_t i = 0; options.attach && i < names.size(); ++i) {
-        kernelSockets.push_back(Attach(server, names[i]));
-    }
-    if (!options.captureFile.empty()) {
-        capture.emplace(options.captureFile, "ostra-simulator");
-        if (capture->Failed()) {
-            throw std::runtime_error("cannot write " + options.captureFile);
-        }
-    }
-    for (std::size_t i = 0; i < kernelSockets.size(); ++i) {
-        server.Serve(kernelSockets[i], names[i], Usb::KernelAsUser);
-    }
 
-    const int stopSignals = BlockedStopSignals();
+    PollLoop& loop_;
+    const ProgramOptions& options_;
+    const std::vector<std::string> names_;
+    std::optional<Varnholt::Capture::PcapngWriter> capture_;
+    std::vector<std::unique_ptr<EepromFile>> files_;
+    UsbIpServer server_;
+};
+
+void Run(const ProgramOptions& options) {
+    PollLoop loop;
+    Instruments instruments(loop, options);
+    const int stopSignals = BlockedStopSignals();  // who reads "ready" may send one at once
+    instruments.Offer();
     loop.Watch(stopSignals, POLLIN, [&loop] { loop.Stop(); });
     if (options.seconds > 0) {
         loop.CallAt(loop.Now() + static_cast<std::uint64_t>(options.seconds * 1e6), [&loop] { loop.Stop(); });
     }
-    if (options.tcpPort) {
-        for (const std::string& name : names) {
-            std::cout << "ready: usbip --tcp-port " << port << " attach -r 127.0.0.1 -b "
-                      << server.Record(name).busId << "  (" << name << ")\n";
-        }
-    }
-    for (const std::string& name : names) {
-        std::cout << "ready: " << Usb::SimulatedPrefix << name << "\n";
-    }
-    std::cout << std::flush;
     loop.Run();
     loop.Unwatch(stopSignals);
     close(stopSignals);
-    if (capture && capture->Failed()) {
-        complain(options.captureFile + " is incomplete");
-    }
-    const auto unsaved = std::ranges::count_if(files, [](const auto& file) { return !file->Finish(); });
-    if (unsaved > 0) {
-        throw std::runtime_error("what was written to the EEPROM is lost");
-    }
+    instruments.Finish();
 }
 
 }  // namespace

@@ -5,6 +5,7 @@
 #include <chrono>
 #include <vector>
 
+#include "Platform/Usb/UsbIpProtocol.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/Instrument.h"
 
@@ -76,23 +77,10 @@ void Store64(std::uint8_t* bytes, std::uint64_t value) {
     Protocol::StoreLittle32(bytes + 4, static_cast<std::uint32_t>(value >> 32));
 }
 
-/// The status as the kernel would give it: a negative errno of Linux.
+/// The kernel calls a device that went under a transfer shut down.
 std::int32_t KernelStatus(Usb::TransferStatus status) {
-    switch (status) {
-        case Usb::TransferStatus::Completed:
-            return 0;
-        case Usb::TransferStatus::Stalled:
-            return -32;
-        case Usb::TransferStatus::IoError:
-            return -71;
-        case Usb::TransferStatus::Overflow:
-            return -75;
-        case Usb::TransferStatus::Cancelled:
-            return -104;
-        case Usb::TransferStatus::DeviceGone:
-            return -108;
-    }
-    return -71;
+    namespace UsbIp = Usb::UsbIp;
+    return status == Usb::TransferStatus::DeviceGone ? UsbIp::LinuxStatus::Shutdown : UsbIp::StatusOf(status);
 }
 
 std::uint8_t TransferType(std::uint8_t endpoint) {

@@ -107,10 +107,14 @@ struct StatusNumber {
 };
 /// The first of a status is the one that is sent.
 constexpr std::array StatusNumbers{
-    StatusNumber{0, TransferStatus::Completed},    StatusNumber{-32, TransferStatus::Stalled},
-    StatusNumber{-71, TransferStatus::IoError},    StatusNumber{-75, TransferStatus::Overflow},
-    StatusNumber{-104, TransferStatus::Cancelled}, StatusNumber{-2, TransferStatus::Cancelled},
-    StatusNumber{-19, TransferStatus::DeviceGone}, StatusNumber{-108, TransferStatus::DeviceGone},
+    StatusNumber{LinuxStatus::Success, TransferStatus::Completed},
+    StatusNumber{LinuxStatus::BrokenPipe, TransferStatus::Stalled},
+    StatusNumber{LinuxStatus::ProtocolError, TransferStatus::IoError},
+    StatusNumber{LinuxStatus::Overflow, TransferStatus::Overflow},
+    StatusNumber{LinuxStatus::ConnectionReset, TransferStatus::Cancelled},
+    StatusNumber{LinuxStatus::NoEntry, TransferStatus::Cancelled},
+    StatusNumber{LinuxStatus::NoDevice, TransferStatus::DeviceGone},
+    StatusNumber{LinuxStatus::Shutdown, TransferStatus::DeviceGone},
 };
 
 void WriteCommon(Writer& writer, Command command, std::uint32_t sequence, std::uint32_t deviceId = 0,

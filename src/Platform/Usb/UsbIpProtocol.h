@@ -125,7 +125,18 @@ PacketBytes Encode(const Packet& packet);
 /// transfer, a payload that is too long.
 std::optional<Packet> DecodePacket(std::span<const std::uint8_t, PacketHeaderSize> bytes);
 
-/// Statuses are negative Linux error numbers.
+/// How transfers end in the words of Linux, on every platform: its error numbers, negative.
+namespace LinuxStatus {
+inline constexpr std::int32_t Success = 0;
+inline constexpr std::int32_t NoEntry = -2;            // ENOENT: unlinked
+inline constexpr std::int32_t NoDevice = -19;          // ENODEV
+inline constexpr std::int32_t BrokenPipe = -32;        // EPIPE: stalled
+inline constexpr std::int32_t ProtocolError = -71;     // EPROTO
+inline constexpr std::int32_t Overflow = -75;          // EOVERFLOW
+inline constexpr std::int32_t ConnectionReset = -104;  // ECONNRESET: unlinked
+inline constexpr std::int32_t Shutdown = -108;         // ESHUTDOWN
+}  // namespace LinuxStatus
+
 std::int32_t StatusOf(TransferStatus status);
 TransferStatus TransferStatusOf(std::int32_t status);
 
