@@ -85,13 +85,11 @@ class Shipped : public testing::Test {
     static std::unique_ptr<ShippedLibrary> library;
 
   public:
-    static std::string hostWithoutEnumeration, poorSetupApi, nativeDriver, usbIoDriver, tool, example;
+    static std::string nativeDriver, usbIoDriver, tool, example;
 };
 
 std::unique_ptr<StandInDriver> Shipped::driver;
 std::unique_ptr<ShippedLibrary> Shipped::library;
-std::string Shipped::hostWithoutEnumeration;
-std::string Shipped::poorSetupApi;
 std::string Shipped::nativeDriver;
 std::string Shipped::usbIoDriver;
 std::string Shipped::tool;
@@ -300,38 +298,6 @@ TEST_F(Shipped, LoadingAndUnloadingLeavesNothing) {
     }
 }
 
-/// Tells Wine where the program of that name gets its setupapi from.
-void ChooseSetupApi(const std::string& program, const std::string& origin) {
-    HKEY key = nullptr;
-    RegCreateKeyExA(HKEY_CURRENT_USER, ("Software\\Wine\\AppDefaults\\" + program + "\\DllOverrides").c_str(),
-                    0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr);
-    RegSetValueExA(key, "setupapi", 0, REG_SZ, reinterpret_cast<const BYTE*>(origin.c_str()),
-                   static_cast<DWORD>(origin.size() + 1));
-    RegCloseKey(key);
-}
-
-/// Runs the host under another name, with a setupapi of its own.
-DWORD RunHostWithoutEnumeration(const std::string& folder, const std::string& name,
-                                const std::string& origin) {
-    CreateDirectoryA(folder.c_str(), nullptr);
-    const std::string program = folder + "\\" + name;
-    CopyFileA(Shipped::hostWithoutEnumeration.c_str(), program.c_str(), FALSE);
-    ChooseSetupApi(name, origin);
-    return ChildProcess(ChildProcess::Program{'"' + program + "\" \"" + ShippedLibrary::path + '"'}).Wait();
-}
-
-TEST_F(Shipped, SetupApiIsMissing) {
-    const std::string path = driver->PlugIn();
-    EXPECT_EQ(RunHostWithoutEnumeration("C:\\missing", "missing.exe", ""), 0U);
-}
-
-TEST_F(Shipped, SetupApiLacksAnEntryPoint) {
-    const std::string path = driver->PlugIn();
-    CreateDirectoryA("C:\\poor", nullptr);
-    ASSERT_TRUE(CopyFileA(poorSetupApi.c_str(), "C:\\poor\\setupapi.dll", FALSE));
-    EXPECT_EQ(RunHostWithoutEnumeration("C:\\poor", "poor.exe", "native"), 0U);
-}
-
 std::string Quoted(const std::string& path) {
     return '"' + path + '"';
 }
@@ -371,43 +337,6 @@ TEST_F(Shipped, ProgramsDoTheWholeJob) {
     EXPECT_EQ(Instrument(path).Eeprom(), std::vector<BYTE>(image.begin(), image.end()));
 }
 
-/// The doctor's exit code and JSON.
-std::pair<DWORD, std::string> Doctor(const std::string& program = Shipped::tool) {
-    return RunProgram(Quoted(program) + " doctor --json");
-}
-
-/// Has been built only, where no 32-bit program runs: `--gtest_also_run_disabled_tests` runs it.
-TEST_F(Shipped, DISABLED_DoctorNamesTheReason) {
-    const bool is64Bit = StandInDriver::HostIs64Bit();
-    const auto expect = [](const std::pair<DWORD, std::string>& told, DWORD code, const std::string& text) {
-        EXPECT_EQ(told.first, code) << told.second;
-        EXPECT_THAT(told.second, HasSubstr(text));
-    };
-    expect(Doctor(), 3, "no device with either driver is plugged in");
-    const std::string path = driver->PlugIn();
-    expect(Doctor(), 0, "answers (firmware ");
-    expect(Doctor(), 0,
-           is64Bit ? "on 64-bit Windows the USBIO driver is used; devices present: 1"
-                   : "on 32-bit Windows the instrument's own driver is used; devices present: 1");
-    expect(RunProgram(Quoted(tool) + " doctor --json --transport " + (is64Bit ? "native" : "usbio")), 3,
-           "which is not used here: --transport asks for");
-    if (is64Bit) {
-        Instrument(path).SetInterfaceVersion(0x0300);
-        expect(Doctor(), 3, "has a USBIO driver of interface version 3.00");
-        Instrument(path).SetInterfaceVersion(0x0230);
-    }
-    // Wine is told which setupapi.dll these programs get.
-    CreateDirectoryA("C:\\doctor", nullptr);
-    ASSERT_TRUE(CopyFileA(tool.c_str(), "C:\\doctor\\doctor.exe", FALSE));
-    ChooseSetupApi("doctor.exe", "");
-    expect(Doctor("C:\\doctor\\doctor.exe"), 3, "setupapi.dll, which finds instruments, cannot be loaded");
-    ASSERT_TRUE(CopyFileA(poorSetupApi.c_str(), "C:\\doctor\\setupapi.dll", FALSE));
-    ChooseSetupApi("doctor.exe", "native");
-    expect(Doctor("C:\\doctor\\doctor.exe"), 3, "setupapi.dll, which finds instruments, lacks functions");
-    Instrument(path).UseElsewhere();
-    expect(Doctor(), 4, "used by another process");
-}
-
 TEST_F(Shipped, ToolShowsTheButtonAndTheRemoval) {
     const std::string path = driver->PlugIn();
     ChildProcess monitor(ChildProcess::Program{Quoted(tool) + " monitor --for 15", PrintedPath});
@@ -437,17 +366,14 @@ int main(int argc, char** argv) {
         ShippedLibrary::path = argv[1];
         return RunAsChild(argv[2], argv[3]);
     }
-    if (argc != 8) {
-        std::puts(
-            "usage: shipped_library_test LIBRARY HOST SETUPAPI NATIVE-DRIVER USBIO-DRIVER TOOL EXAMPLE");
+    if (argc != 6) {
+        std::puts("usage: shipped_library_test LIBRARY NATIVE-DRIVER USBIO-DRIVER TOOL EXAMPLE");
         return 2;
     }
     ShippedLibrary::path = argv[1];
-    Shipped::hostWithoutEnumeration = argv[2];
-    Shipped::poorSetupApi = argv[3];
-    Shipped::nativeDriver = argv[4];
-    Shipped::usbIoDriver = argv[5];
-    Shipped::tool = argv[6];
-    Shipped::example = argv[7];
+    Shipped::nativeDriver = argv[2];
+    Shipped::usbIoDriver = argv[3];
+    Shipped::tool = argv[4];
+    Shipped::example = argv[5];
     return RUN_ALL_TESTS();
 }

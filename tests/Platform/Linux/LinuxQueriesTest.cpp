@@ -11,19 +11,12 @@
 namespace Varnholt::Platform {
 namespace {
 
-using testing::EndsWith;
-using testing::HasSubstr;
-
 TEST(ErrorTexts, AreSentencesOfTheirOwn) {
     std::set<std::string> texts;
-    for (const ErrorCode code : {Errors::Success, Errors::FileNotFound, Errors::AccessDenied, Errors::Busy,
-                                 Errors::GeneralFailure, Errors::IoIncomplete, Errors::DeviceNotConnected}) {
-        const std::string text = ErrorText(code);
-        EXPECT_THAT(text, testing::AllOf(EndsWith("."), testing::Not(HasSubstr("\n")),
-                                         testing::Not(HasSubstr("Unknown"))));
-        EXPECT_TRUE(texts.insert(text).second) << text;
+    for (const ErrorCode code : {0u, 2u, 5u, 31u, 170u, 996u, 1167u}) {
+        EXPECT_THAT(ErrorText(code), testing::MatchesRegex("[A-TV-Z][^\n]*\\."));
+        EXPECT_TRUE(texts.insert(ErrorText(code)).second) << code;
     }
-    EXPECT_EQ(ErrorText(1234), "Unknown error 1234.");
     EXPECT_EQ(ErrorText(0xE000100C), "Unknown error 3758100492.");
 }
 

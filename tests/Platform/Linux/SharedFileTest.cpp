@@ -2,7 +2,6 @@
 #include <gtest/gtest.h>
 #include <sys/file.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -10,6 +9,7 @@
 #include <functional>
 #include <set>
 
+#include "ForkedProcess.h"
 #include "Platform/ErrorCodes.h"
 #include "Platform/Linux/SharedFile.h"
 #include "Platform/WaitableObjects.h"
@@ -52,25 +52,12 @@ TEST_F(SharedFiles, AreTheUsersOwnAndGoWithTheLastHandle) {
 }
 
 TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
-    struct {
-        const char* text;
-        std::function<void(const std::string&)> make;
-    } const cases[] = {
-        {"empty", [](const std::string& file) { std::ofstream{file}; }},
-        {"short", [](const std::string& file) { std::ofstream(file) << "OSTRA"; }},
-        {"garbage of a page",
-         [](const std::string& file) { std::ofstream(file) << std::string(4096, '\xFF'); }},
-        {"garbage of the same size",
-         [](const std::string& file) {
-             const OwnedHandle mutex(MakeMutex(UniqueName("size")));
-             const auto size =
-                 static_cast<std::size_t>(std::filesystem::file_size(PathOf(UniqueName("size"))));
-             std::ofstream(file) << std::string(size, '\x5A');
-         }},
-    };
-    for (const auto& content : cases) {
-        SCOPED_TRACE(content.text);
-        content.make(path_);
+    const OwnedHandle other(MakeMutex(UniqueName("size")));
+    const std::size_t size = std::filesystem::file_size(PathOf(UniqueName("size")));
+    for (const std::string& content :
+         {std::string(), std::string("OSTRA"), std::string(4096, '\xFF'), std::string(size, '\x5A')}) {
+        SCOPED_TRACE(content.size());
+        std::ofstream(path_) << content;
         const int user = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
         ASSERT_EQ(flock(user, LOCK_SH), 0);
         SetLastError(Errors::Success);
@@ -111,14 +98,8 @@ TEST_F(SharedFiles, ThatAreNoFilesOfOursAreRefused) {
 
 /// A process that died left its file behind, and in it a mutex that is still owned.
 TEST_F(SharedFiles, OfTheDeadAreTakenOver) {
-    const pid_t child = fork();
-    if (child == 0) {
-        const Handle mutex = MakeMutex(name_);
-        Wait(mutex, 0);
-        std::_Exit(0);
-    }
-    int status = 0;
-    ASSERT_EQ(waitpid(child, &status, 0), child);
+    ForkedProcess dying([this] { return static_cast<int>(Wait(MakeMutex(name_), 0)); });
+    EXPECT_EQ(dying.WaitForExit(), static_cast<int>(WaitResult::Signalled));
     ASSERT_TRUE(std::filesystem::exists(path_));
     OwnedHandle mutex(MakeMutex(name_));
     EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Abandoned);

@@ -2,6 +2,9 @@
 #include <gtest/gtest.h>
 
 #include <optional>
+#include <string>
+#include <utility>
+#include <vector>
 
 #include "Platform/DeviceFiles.h"
 #include "Platform/DeviceInterfaces.h"
@@ -16,32 +19,24 @@ namespace {
 
 using Protocol::NativeDriver::InterfaceClass;
 using testing::ElementsAre;
-using testing::IsEmpty;
-
-struct NameCase {
-    const char* description;
-    std::string valueName;
-    bool matches;
-};
 
 TEST(RegistryInterfaces, ClassIsReadFromTheValueName) {
-    const NameCase cases[] = {
-        {"the class alone", "{00873FDF-61A8-11D1-AA5E-00C04FB1728B}", true},
-        {"lower case", "{00873fdf-61a8-11d1-aa5e-00c04fb1728b}", true},
-        {"something behind it", "{00873FDF-61A8-11D1-AA5E-00C04FB1728B}\\0001", true},
-        {"another class", "{989D6515-E122-4442-A357-751457F102A5}", false},
-        {"another first number", "{00873FDE-61A8-11D1-AA5E-00C04FB1728B}", false},
-        {"another byte in the fourth group", "{00873FDF-61A8-11D1-AA5F-00C04FB1728B}", false},
-        {"another last byte", "{00873FDF-61A8-11D1-AA5E-00C04FB1728C}", false},
-        {"fourth group too short", "{00873FDF-61A8-11D1-AA5-00C04FB1728B}", false},
-        {"last group too short", "{00873FDF-61A8-11D1-AA5E-00C04FB1728}", false},
-        {"no hexadecimal digits at the end", "{00873FDF-61A8-11D1-AA5E-00C04FB172XY}", false},
-        {"no brace", "00873FDF-61A8-11D1-AA5E-00C04FB1728B", false},
-        {"empty", "", false},
-        {"groups longer than any buffer", "{00873FDF-61A8-11D1-" + std::string(5000, 'A') + "}", false},
-    };
-    for (const NameCase& row : cases) {
-        EXPECT_EQ(NamesInterfaceOf(InterfaceClass, row.valueName), row.matches) << row.description;
+    for (const auto& [valueName, matches] : std::vector<std::pair<std::string, bool>>{
+             {"{00873FDF-61A8-11D1-AA5E-00C04FB1728B}", true},
+             {"{00873fdf-61a8-11d1-aa5e-00c04fb1728b}", true},
+             {"{00873FDF-61A8-11D1-AA5E-00C04FB1728B}\\0001", true},
+             {"{989D6515-E122-4442-A357-751457F102A5}", false},
+             {"{00873FDE-61A8-11D1-AA5E-00C04FB1728B}", false},
+             {"{00873FDF-61A8-11D1-AA5F-00C04FB1728B}", false},
+             {"{00873FDF-61A8-11D1-AA5E-00C04FB1728C}", false},
+             {"{00873FDF-61A8-11D1-AA5-00C04FB1728B}", false},
+             {"{00873FDF-61A8-11D1-AA5E-00C04FB1728}", false},
+             {"{00873FDF-61A8-11D1-AA5E-00C04FB172XY}", false},
+             {"00873FDF-61A8-11D1-AA5E-00C04FB1728B", false},
+             {"", false},
+             {"{00873FDF-61A8-11D1-" + std::string(5000, 'A') + "}", false},
+         }) {
+        EXPECT_EQ(NamesInterfaceOf(InterfaceClass, valueName), matches) << valueName.substr(0, 50);
     }
 }
 
@@ -92,11 +87,8 @@ TEST_F(OldRegistry, AnswersOnlyOldHostsAndOnlyWhenAsked) {
     EXPECT_EQ(finds(true), "");
     OverrideVersionRecord(VersionRecord{1, 4, 10, 1998, ""});
     EXPECT_EQ(finds(true), "");
-}
-
-TEST_F(OldRegistry, WithoutTheKeyThereIsNothing) {
     RegDeleteKeyA(HKEY_LOCAL_MACHINE, Path);
-    EXPECT_THAT(ListRegistryInterfaces(InterfaceClass), IsEmpty());
+    EXPECT_THAT(ListRegistryInterfaces(InterfaceClass), testing::IsEmpty());
 }
 
 }  // namespace

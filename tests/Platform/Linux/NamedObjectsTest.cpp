@@ -1,0 +1,142 @@
+#include <gtest/gtest.h>
+
+#include <array>
+#include <cstdio>
+#include <deque>
+#include <fstream>
+#include <string>
+
+#include "ForkedProcess.h"
+#include "Platform/Threads.h"
+#include "Support/ResourceCount.h"
+#include "TestThread.h"
+#include "UniqueName.h"
+
+namespace Varnholt::Platform {
+namespace {
+
+using TestSupport::ResourceCount;
+
+std::string NameOfThisTest() {
+    return UniqueName(testing::UnitTest::GetInstance()->current_test_info()->name());
+}
+
+/// A mutex and what another process and the test tell each other about it.
+struct Stage {
+    bool Acquire() const { return Wait(mutex.Get(), LongTimeout) == WaitResult::Signalled; }
+    bool AwaitReady() const { return Wait(ready.Get(), LongTimeout) == WaitResult::Signalled; }
+    bool AwaitGo() const { return Wait(go.Get(), LongTimeout) == WaitResult::Signalled; }
+    void SayReady() const { ReleaseSemaphore(ready.Get(), 1); }
+    void SayGo() const { ReleaseSemaphore(go.Get(), 1); }
+
+    const OwnedHandle mutex{MakeMutex(NameOfThisTest())};
+    const OwnedHandle ready{MakeSemaphore(0, 100, NameOfThisTest() + ".ready")};
+    const OwnedHandle go{MakeSemaphore(0, 100, NameOfThisTest() + ".go")};
+};
+
+TEST(NamedMutexes, ExcludeOtherProcessesUntilTheLastRelease) {
+    ForkedProcess holder([] {
+        const Stage stage;
+        bool isGood = stage.Acquire() && stage.Acquire();
+        for (int i = 0; i < 2; ++i) {
+            stage.SayReady();
+            isGood = stage.AwaitGo() && ReleaseMutex(stage.mutex.Get()) && isGood;
+        }
+        return isGood ? 0 : 1;
+    });
+    const Stage stage;
+    for (int held = 0; held < 2; ++held) {
+        EXPECT_TRUE(stage.AwaitReady());
+        EXPECT_EQ(Wait(stage.mutex.Get(), 30), WaitResult::TimedOut);
+        EXPECT_FALSE(ReleaseMutex(stage.mutex.Get()));
+        stage.SayGo();
+    }
+    const OwnedHandle event(MakeAutoResetEvent());
+    const WaitAnyResult outcome = WaitAny(std::array{event.Get(), stage.mutex.Get()}, LongTimeout);
+    EXPECT_EQ(outcome.result, WaitResult::Signalled);
+    EXPECT_EQ(outcome.index, 1u);
+    EXPECT_EQ(holder.WaitForExit(), 0);
+    EXPECT_TRUE(ReleaseMutex(stage.mutex.Get()));
+}
+
+TEST(NamedMutexes, OfAProcessThatDiedAreAbandoned) {
+    for (const bool isKilled : {true, false}) {
+        ForkedProcess holder([] {
+            static const Stage stage;  // lets nothing go when the process ends
+            const bool isGood = stage.Acquire();
+            stage.SayReady();
+            stage.AwaitGo();
+            return isGood ? 0 : 1;
+        });
+        const Stage stage;
+        EXPECT_TRUE(stage.AwaitReady());
+        WaitResult result{};
+        TestThread waiting([&] {
+            result = Wait(stage.mutex.Get(), LongTimeout);
+            ReleaseMutex(stage.mutex.Get());
+        });
+        SleepMilliseconds(20);
+        if (isKilled) {
+            holder.Kill();
+        } else {
+            stage.SayGo();
+            EXPECT_EQ(holder.WaitForExit(), 0);
+        }
+        waiting.Join();
+        EXPECT_EQ(result, WaitResult::Abandoned);
+        EXPECT_TRUE(stage.Acquire());
+        EXPECT_TRUE(ReleaseMutex(stage.mutex.Get()));
+    }
+}
+
+/// Several processes make, take and close one mutex all the time: none may end up with a mutex of its own.
+TEST(NamedMutexes, AreOneHoweverTheyComeAndGo) {
+    constexpr int Processes = 4, Rounds = 150;
+    const std::string path = testing::TempDir() + NameOfThisTest() + ".count";
+    std::ofstream(path) << 0;
+    const auto increase = [&path] {
+        for (int i = 0; i < Rounds; ++i) {
+            const OwnedHandle mutex(MakeMutex(NameOfThisTest()));
+            if (Wait(mutex.Get(), LongTimeout) != WaitResult::Signalled) {
+                return 1;
+            }
+            int count = 0;
+            std::ifstream(path) >> count;
+            std::ofstream(path) << count + 1;
+            ReleaseMutex(mutex.Get());
+        }
+        return 0;
+    };
+    std::deque<ForkedProcess> others;
+    for (int i = 0; i < Processes; ++i) {
+        others.emplace_back(increase);
+    }
+    EXPECT_EQ(increase(), 0);
+    for (ForkedProcess& other : others) {
+        EXPECT_EQ(other.WaitForExit(), 0);
+    }
+    int count = 0;
+    std::ifstream(path) >> count;
+    std::remove(path.c_str());
+    EXPECT_EQ(count, (Processes + 1) * Rounds);
+}
+
+TEST(NamedObjects, LeaveNothingBehind) {
+    const auto use = [] {
+        const OwnedHandle mutex(MakeMutex(NameOfThisTest()));
+        const OwnedHandle again(MakeMutex(NameOfThisTest()));
+        const OwnedHandle semaphore(MakeSemaphore(0, 1, NameOfThisTest() + ".semaphore"));
+        // Whoever owns a mutex when its last handle goes does not keep it.
+        EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
+    };
+    TestThread(use).Join();  // a sanitizer starts a thread of its own with the first
+    const ResourceCount before = ResourceCount::TakeSettled();
+    for (int i = 0; i < 20; ++i) {
+        use();
+    }
+    TestThread(use).Join();
+    EXPECT_TRUE(before.Settles()) << before << " before, " << ResourceCount::Take() << " after";
+}
+
+}  // namespace
+}  // namespace Varnholt::Platform
