@@ -18,44 +18,44 @@ class InstrumentCommandsTest : public ToolTest {};
 OSTRA_ON_BOTH_TRANSPORTS(InstrumentCommandsTest);
 
 TEST_P(InstrumentCommandsTest, List) {
-    Fail({"list"}, ExitCode::NoInstrument, "no instrument is connected");
+    Fail("list", ExitCode::NoInstrument, "no instrument is connected");
     EXPECT_EQ(tool_.Out(), "");
-    Fail({"list", "--json"}, ExitCode::NoInstrument);
+    Fail("list --json", ExitCode::NoInstrument);
     EXPECT_EQ(tool_.Json()["instruments"].size(), 0u);
 
     host_.Add("sim-b");
     host_.Add("sim-a");
-    Succeed({"list"});
+    Succeed("list");
     EXPECT_EQ(tool_.Out(),
               "NAME   IDENTIFIER\nsim-a  " + Identifier("sim-a") + "\nsim-b  " + Identifier("sim-b") + "\n");
     EXPECT_EQ(tool_.Err(), "");
-    Succeed({"list", "--json"});
+    Succeed("list --json");
     EXPECT_EQ(tool_.Out(), std::string("{\"transport\":\"") + Name(GetParam()) +
                                "\",\"instruments\":[{\"identifier\":\"" + Identifier("sim-a") +
                                "\",\"name\":\"sim-a\"},{\"identifier\":\"" + Identifier("sim-b") +
                                "\",\"name\":\"sim-b\"}]}\n");
     const Transport other = GetParam() == Transport::Native ? Transport::UsbIo : Transport::Native;
-    Succeed({"identify", "--transport", Name(other), "--json"});
+    Succeed(std::string("identify --transport ") + Name(other) + " --json");
     EXPECT_EQ(tool_.Json()["identifier"], std::string(Name(other)) + "/sim-a");
-    Succeed({"identify", "--json"});
+    Succeed("identify --json");
     EXPECT_EQ(tool_.Json()["identifier"], Identifier("sim-a")) << "the choice was for one command";
 }
 
 /// All forms of one readout hold the same values.
 TEST_P(InstrumentCommandsTest, ReadoutForms) {
     auto& instrument = host_.Add("sim", Leisurely());
-    Succeed({"readout", "--raw", "--output", folder_.Path("raw")});
+    Succeed("readout --raw --output @raw");
     EXPECT_EQ(ParametersOf(instrument), (Simulator::MeasureParameters{294, 0, 1, 6}));
     EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 1u);
     const auto bytes = ReadFile(folder_.Path("raw"));
     ASSERT_EQ(bytes.size(), 256u);
     const auto values = Interface::ReadoutFromBytes(std::span<const std::uint8_t, 256>(bytes.data(), 256));
     host_.Add("sim");  // the same noise once more for each
-    Succeed({"readout", "--json"});
+    Succeed("readout --json");
     EXPECT_THAT(tool_.Json()["values"].get<std::vector<int>>(), testing::ElementsAreArray(values));
 
     host_.Add("sim");
-    Succeed({"readout", "--csv"});
+    Succeed("readout --csv");
     std::string csv = "1,0.000", table;
     for (std::size_t i = 0; i < values.size(); ++i) {
         csv += "," + std::to_string(values[i]);
@@ -68,7 +68,7 @@ TEST_P(InstrumentCommandsTest, ReadoutForms) {
     EXPECT_TRUE(tool_.Lines()[1].ends_with(",294,0,1,6,0.019992"));
 
     host_.Add("sim");
-    Succeed({"readout"});
+    Succeed("readout");
     EXPECT_EQ(tool_.Lines().size(), 17u);
     std::istringstream printed(tool_.Out());
     std::string words;
@@ -81,7 +81,7 @@ TEST_P(InstrumentCommandsTest, ReadoutForms) {
 /// What the numbers were taken with, and when: from start to start.
 TEST_P(InstrumentCommandsTest, ReadoutsSayWhatTheyWereTakenWith) {
     struct Case {
-        Arguments options;
+        const char* options;
         nlohmann::json parameters;
         double time;
         int mode;
@@ -90,19 +90,17 @@ TEST_P(InstrumentCommandsTest, ReadoutsSayWhatTheyWereTakenWith) {
         std::uint16_t firmware = InstrumentSettings().firmware;
     };
     for (const Case& row : {
-             Case{{}, {294, 0, 1, 6}, 294 * 68e-6, 1, 86340, 52},  // longer than 32 bits count milliseconds
-             Case{{"--parameters", "7,1,2,3"}, {7, 1, 2, 3}, 7 * 68e-6, 1},
-             Case{{"--integration-time", "0.5"}, {7353, 0, 1, 6}, 7353 * 68e-6, 1},
-             Case{{"--integration-time", "0.005"}, {147, 0, 1, 6}, 147 * 34e-6, 2},
-             Case{{}, {294, 0, 1, 6}, 294 * 68e-6, 1, 60, 2, 300},
+             Case{"", {294, 0, 1, 6}, 294 * 68e-6, 1, 86340, 52},  // longer than 32 bits count milliseconds
+             Case{"--parameters 7,1,2,3", {7, 1, 2, 3}, 7 * 68e-6, 1},
+             Case{"--integration-time 0.5", {7353, 0, 1, 6}, 7353 * 68e-6, 1},
+             Case{"--integration-time 0.005", {147, 0, 1, 6}, 147 * 34e-6, 2},
+             Case{"", {294, 0, 1, 6}, 294 * 68e-6, 1, 60, 2, 300},
          }) {
         InstrumentSettings settings = Leisurely();
         settings.firmware = row.firmware;
         auto& instrument = host_.Add("sim", settings);
-        Arguments arguments = row.options;
-        arguments.insert(arguments.begin(), {"readout", "--json", "--repeat", std::to_string(row.repeat),
-                                             "--interval", std::to_string(row.interval)});
-        Succeed(arguments);
+        Succeed("readout --json --repeat " + std::to_string(row.repeat) + " --interval " +
+                std::to_string(row.interval) + " " + row.options);
         EXPECT_EQ(tool_.Lines().size(), row.repeat);
         EXPECT_EQ(ModeOf(instrument), row.mode);
         int number = 0;
@@ -121,7 +119,7 @@ TEST_P(InstrumentCommandsTest, ReadoutsSayWhatTheyWereTakenWith) {
         }
     }
     host_.Add("sim");
-    Fail({"readout", "--integration-time", "60"}, ExitCode::BadData, "Integration time too high");
+    Fail("readout --integration-time 60", ExitCode::BadData, "Integration time too high");
     EXPECT_THAT(tool_.Err(), HasSubstr("mode 2: 0.00442 s to 2.22819 s"));
 }
 
@@ -152,8 +150,8 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
         Service::Interruption interruption;
         tool_.interruption = &interruption;
         const auto event = After(row.interruptedAt, [&] { interruption.Request(); });
-        Fail({"readout", "--csv", "--repeat", row.repeat, "--interval", "1", "--output", folder_.Path("csv")},
-             row.code, row.text);
+        Fail(std::string("readout --csv --repeat ") + row.repeat + " --interval 1 --output @csv", row.code,
+             row.text);
         Platform::ClockScheduler().Forget(event);
         const bool isReplaced = row.code == ExitCode::Success && row.lines > 0;
         const std::string kept = folder_.Path(isReplaced ? "csv" : "csv.part");
@@ -167,24 +165,24 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
 
 TEST_P(InstrumentCommandsTest, PlotsUseWhatTheTerminalHas) {
     host_.Add("sim", Leisurely());
-    const auto isBraille = [this](const Arguments& arguments) {
-        Succeed(arguments);
+    const auto isBraille = [this](const char* line) {
+        Succeed(line);
         EXPECT_NE(tool_.Out().find('*') != std::string::npos,
                   tool_.Out().find("\xE2\xA0") != std::string::npos);
         return tool_.Out().find('*') == std::string::npos;
     };
-    EXPECT_FALSE(isBraille({"readout", "--plot"}));
+    EXPECT_FALSE(isBraille("readout --plot"));
     tool_.outFacts.showsUtf8 = true;
-    EXPECT_TRUE(isBraille({"readout", "--plot"}));
-    EXPECT_FALSE(isBraille({"readout", "--plot", "--ascii"}));
+    EXPECT_TRUE(isBraille("readout --plot"));
+    EXPECT_FALSE(isBraille("readout --plot --ascii"));
 
     tool_.outFacts.isTerminal = true;
-    Succeed({"readout", "--plot", "--ascii", "--repeat", "3"});
+    Succeed("readout --plot --ascii --repeat 3");
     EXPECT_EQ(tool_.Out().find('\x1b'), std::string::npos) << "a terminal that cannot be drawn on";
     tool_.outFacts.movesCursor = true;
     for (const Cli::TerminalSize size : {Cli::TerminalSize{20, 24}, {40, 10}, {132, 50}}) {
         tool_.outFacts.size = [size] { return size; };
-        Succeed({"readout", "--plot", "--ascii", "--repeat", "3"});
+        Succeed("readout --plot --ascii --repeat 3");
         int lines = 0, drawnOver = 0;
         for (const std::string& line : tool_.Lines()) {
             if (line.starts_with("\r\x1b[")) {
@@ -206,10 +204,7 @@ TEST_P(InstrumentCommandsTest, OutputThatCannotBeWrittenEndsACommandAtOnce) {
     settings.bytesPerSecond = 100'000;
     auto& instrument = host_.Add("sim", settings);
     tool_.CloseOut();
-    for (const Arguments& command :
-         std::vector<Arguments>{{"readout", "--csv", "--repeat", "60", "--interval", "1"},
-                                {"monitor", "--for", "60"},
-                                {"scan"}}) {
+    for (const char* command : {"readout --csv --repeat 60 --interval 1", "monitor --for 60", "scan"}) {
         const Stopwatch watch(clock_);
         const auto event = After(500'000, [&] { instrument.PressButton(); });
         Fail(command, ExitCode::File, "the output cannot be written");
@@ -222,7 +217,7 @@ TEST_P(InstrumentCommandsTest, IdentifyAndReset) {
     InstrumentSettings settings;
     settings.firmware = 305;
     auto& instrument = host_.Add("sim", settings);
-    Succeed({"identify", "--json"});
+    Succeed("identify --json");
     auto found = tool_.Json();
     EXPECT_EQ(found["mode"][0], 3);
     EXPECT_EQ(found["parameters"][4], 0x55);
@@ -233,31 +228,31 @@ TEST_P(InstrumentCommandsTest, IdentifyAndReset) {
                                      {"name", "sim"},
                                      {"chipId", "5a0123456789abcd"},
                                      {"misc", {0x21, 305, 0x43, 0x0506, 0x0708}}}));
-    Succeed({"identify"});
+    Succeed("identify");
     EXPECT_THAT(tool_.Out(), HasSubstr("5a0123456789abcd"));
-    Succeed({"reset", "--code", "017"});
+    Succeed("reset --code 017");
     instrument.WithCommands([](const Simulator::Commands& commands) {
         EXPECT_EQ(commands.lastResetCode, 17) << "a leading zero means nothing";
         EXPECT_EQ(commands.resets, 4u) << "each opening resets it as well";
     });
-    Fail({"reset", "--code", "256"}, ExitCode::Usage);
+    Fail("reset --code 256", ExitCode::Usage);
 }
 
 TEST_P(InstrumentCommandsTest, MonitorReportsButtonAndRemovalAndEndsInTime) {
     auto& instrument = host_.Add("sim");
     const Stopwatch watch(clock_);
-    Succeed({"monitor", "--for", "3"});
+    Succeed("monitor --for 3");
     watch.ExpectBetween(3000, 3100);
     EXPECT_EQ(tool_.Out(), "");
     Service::Interruption interruption;
     tool_.interruption = &interruption;
     After(1'000'000, [&] { interruption.Request(); });
-    Succeed({"monitor"});
+    Succeed("monitor");
     EXPECT_EQ(tool_.Out(), "") << "an end that the user wants is no removal";
     tool_.interruption = nullptr;
     After(1'000'000, [&] { instrument.PressButton(); });
     After(2'000'000, [&] { host_.Bus().Unplug("sim"); });
-    Succeed({"monitor", "--json"});
+    Succeed("monitor --json");
     ASSERT_EQ(tool_.Lines().size(), 2u) << tool_.Out();
     const auto button = nlohmann::json::parse(tool_.Lines()[0]);
     EXPECT_EQ(button["event"], "button");
@@ -268,30 +263,30 @@ TEST_P(InstrumentCommandsTest, MonitorReportsButtonAndRemovalAndEndsInTime) {
 TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
     host_.Add("left");
     host_.Add("right");
-    Fail({"identify", "--device", "up"}, ExitCode::NoInstrument, Identifier("right"));
-    Succeed({"identify", "--json"});
+    Fail("identify --device up", ExitCode::NoInstrument, Identifier("right"));
+    Succeed("identify --json");
     EXPECT_EQ(tool_.Json()["name"], "left");
     EXPECT_THAT(tool_.Err(), HasSubstr("taking " + Identifier("left")));
-    for (const Arguments& arguments : std::vector<Arguments>{
-             {"identify", "--device", "ight", "--json"},
-             {"-d", "right", "identify", "--json"},
-             {"--device=right", "--transport", Name(GetParam()), "identify", "--json"},
-             {"-d", "right", "identify", "--json", "-d", "right"},
-             {"ram", "-d", "right", "show", "--json"},
+    for (const std::string& line : std::vector<std::string>{
+             "identify --device ight --json",
+             "-d right identify --json",
+             std::string("--device=right identify --json --transport ") + Name(GetParam()),
+             "-d right identify --json -d right",
+             "ram -d right show --json",
          }) {
-        Succeed(arguments);
+        Succeed(line);
         EXPECT_EQ(tool_.Json()["identifier"], Identifier("right"));
         EXPECT_EQ(tool_.Err(), "");
     }
-    for (const auto& [arguments, text] : std::vector<std::pair<Arguments, const char*>>{
-             {{"-d", "left", "identify", "-d", "right"}, "--device is given twice: left and right"},
-             {{"-d", "left", "list"}, "--device means nothing to `ostra list`"},
-             {{"list", "-d", "left"}, "--device means nothing to `ostra list`"},
-             {{"-d", "left", "eeprom", "check", "image"}, "--device excludes --image"},
-             {{"--transport", "serial", "list"}, "serial"},
-             {{"identify", "-d", "chip:5a"}, "16 hexadecimal digits"},
+    for (const auto& [line, text] : std::vector<std::pair<const char*, const char*>>{
+             {"-d left identify -d right", "--device is given twice: left and right"},
+             {"-d left list", "--device means nothing to `ostra list`"},
+             {"list -d left", "--device means nothing to `ostra list`"},
+             {"-d left eeprom check image", "--device excludes --image"},
+             {"--transport serial list", "serial"},
+             {"identify -d chip:5a", "16 hexadecimal digits"},
          }) {
-        Fail(arguments, ExitCode::Usage, text);
+        Fail(line, ExitCode::Usage, text);
     }
 }
 
@@ -300,25 +295,25 @@ TEST_P(InstrumentCommandsTest, ChipsTellInstrumentsApart) {
     settings.chipId = {1, 2, 3, 4, 5, 6, 7, 8};
     auto& left = host_.Add("left");
     host_.Add("right", settings);
-    Succeed({"list", "--chip-id"});
+    Succeed("list --chip-id");
     EXPECT_THAT(tool_.Lines()[2], testing::AllOf(HasSubstr("right"), HasSubstr("0102030405060708")));
-    Succeed({"identify", "--device", "chip:5A0123456789ABCD", "--json"});
+    Succeed("identify --device chip:5A0123456789ABCD --json");
     EXPECT_EQ(tool_.Json()["name"], "left");
 
     ASSERT_EQ(left.Claim(), Platform::Errors::Success);
-    Succeed({"list", "--chip-id", "--json"});
+    Succeed("list --chip-id --json");
     const auto instruments = tool_.Json()["instruments"];
     EXPECT_EQ(instruments[0]["chipId"], nullptr);
     EXPECT_THAT(instruments[0]["problem"].get<std::string>(), HasSubstr("used by another process"));
     EXPECT_EQ(instruments[1]["chipId"], "0102030405060708");
-    Succeed({"identify", "-d", "chip:0102030405060708", "--json"});
+    Succeed("identify -d chip:0102030405060708 --json");
     EXPECT_EQ(tool_.Json()["name"], "right");
-    Fail({"identify", "-d", "chip:5a0123456789abcd"}, ExitCode::NotAvailable,
+    Fail("identify -d chip:5a0123456789abcd", ExitCode::NotAvailable,
          Identifier("left") + ": the instrument is used");
     left.Release();
-    Fail({"identify", "-d", "chip:5a0123456789abce"}, ExitCode::NoInstrument, "chip:5a0123456789abce");
+    Fail("identify -d chip:5a0123456789abce", ExitCode::NoInstrument, "chip:5a0123456789abce");
     host_.Bus().SetFaults("left", Simulator::FaultPlan::Parse("control 0+:stall"));
-    Fail({"list", "--chip-id", "--json"}, ExitCode::InputOutput, Identifier("left"));
+    Fail("list --chip-id --json", ExitCode::InputOutput, Identifier("left"));
     EXPECT_EQ(tool_.Json()["instruments"].size(), 2u);
 }
 
@@ -334,7 +329,7 @@ TEST_P(InstrumentCommandsTest, VerboseTellsWhatIsSent) {
         }
         return lines;
     };
-    Succeed({"readout", "--verbose"});
+    Succeed("readout --verbose");
     EXPECT_EQ(told(),
               std::string("ostra: Reset code=31\n"
                           "ostra: SetMeasureParameters p1=294 p2=0 p3=1 p4=6\n"
@@ -342,83 +337,73 @@ TEST_P(InstrumentCommandsTest, VerboseTellsWhatIsSent) {
                           "ostra: bulk in 256 of 256\n") +
                   (GetParam() == Transport::Native ? "ostra: ButtonReport\n" : ""));  // of the closing
     SetFaults("bulk-in 0:stall");
-    Fail({"-v", "readout"}, ExitCode::InputOutput, Identifier() + ": ");
+    Fail("-v readout", ExitCode::InputOutput, Identifier() + ": ");
     EXPECT_THAT(told(), HasSubstr("\nostra: bulk in 0 of 256: failed with code 0x"));
 }
 
 TEST(CommandLineTest, UsageErrorsGoToStandardError) {
     ToolRunner tool;
-    for (const auto& [arguments, text] : std::vector<std::pair<Arguments, const char*>>{
-             {{}, ""},
-             {{"no-such-command"}, "`ostra` has no command 'no-such-command'"},
-             {{"eeprom"}, "`ostra eeprom --help`"},
-             {{"eeprom", "--no-such-option", "no-such-command"},
-              "`ostra eeprom` has no command 'no-such-command'"},
-             {{"help", "eeprom", "chekc"}, "`ostra eeprom` has no command 'chekc'"},
-             {{"eeprom", "check", ""}, ""},
-             {{"identify", "--device", ""}, ""},
-             {{"readout", "--no-such-option"}, ""},
-             {{"readout", "one", "two"}, "one two"},
-             {{"readout", "--repeat", "-1"}, ""},
-             {{"readout", "--parameters", "1,2,3"}, ""},
-             {{"readout", "--parameters", "1,2,3,256"}, ""},
-             {{"readout", "--parameters", "1,2,3,4", "--integration-time", "1"}, ""},
-             {{"readout", "--integration-time", "0"}, ""},
-             {{"readout", "--integration-time", "nan"}, ""},
-             {{"readout", "--interval", "nan"}, ""},
-             {{"monitor", "--for", "0"}, ""},
-             {{"scan", "--records", "0"}, ""},
-             {{"scan", "--total", "0"}, ""},
-             {{"scan", "--record-size", "6554"}, ""},
-             {{"scan", "--record-size", "0"}, ""},
-             {{"scan", "--record-size", "7"}, ""},
-             {{"scan", "--total", "256", "--records", "1"}, ""},
-             {{"scan", "--json"}, ""},
-             {{"scan", "--json", "--output", "-"}, ""},
-             {{"scan", "--discard"}, ""},
-             {{"scan", "--raw", "--header"}, ""},
-             {{"scan", "--raw", "--number"}, ""},
-             {{"scan", "--raw", "--time"}, ""},
-             {{"eeprom", "restore", "image", "--no-backup"}, ""},
-             {{"list", "--transport", "serial"}, ""},
-             {{"list", "--capture", ""}, ""},
-             {{"write-image"}, ""},
+    for (const auto& [line, text] : std::vector<std::pair<const char*, const char*>>{
+             {"", ""},
+             {"no-such-command", "`ostra` has no command 'no-such-command'"},
+             {"eeprom", "`ostra eeprom --help`"},
+             {"eeprom --no-such-option no-such-command", "`ostra eeprom` has no command 'no-such-command'"},
+             {"help eeprom chekc", "`ostra eeprom` has no command 'chekc'"},
+             {"eeprom check ''", ""},
+             {"identify --device ''", ""},
+             {"readout --no-such-option", ""},
+             {"readout one two", "one two"},
+             {"readout --repeat -1", ""},
+             {"readout --parameters 1,2,3", ""},
+             {"readout --parameters 1,2,3,256", ""},
+             {"readout --parameters 1,2,3,4 --integration-time 1", ""},
+             {"readout --integration-time 0", ""},
+             {"readout --integration-time nan", ""},
+             {"readout --interval nan", ""},
+             {"monitor --for 0", ""},
+             {"scan --records 0", ""},
+             {"scan --total 0", ""},
+             {"scan --record-size 6554", ""},
+             {"scan --record-size 0", ""},
+             {"scan --record-size 7", ""},
+             {"scan --total 256 --records 1", ""},
+             {"scan --json", ""},
+             {"scan --json --output -", ""},
+             {"scan --discard", ""},
+             {"scan --raw --header", ""},
+             {"scan --raw --number", ""},
+             {"scan --raw --time", ""},
+             {"eeprom restore image --no-backup", ""},
+             {"list --transport serial", ""},
+             {"list --capture ''", ""},
+             {"write-image", ""},
          }) {
-        EXPECT_EQ(tool.Run(arguments), ExitCode::Usage) << testing::PrintToString(arguments);
+        EXPECT_EQ(tool.Run(line), ExitCode::Usage) << line;
         EXPECT_EQ(tool.Out(), "");
         EXPECT_NE(tool.Err(), "");
         EXPECT_THAT(tool.Err(), HasSubstr(text));
     }
-    EXPECT_EQ(tool.Run({"--help"}), ExitCode::Success);
+    EXPECT_EQ(tool.Run("--help"), ExitCode::Success);
     EXPECT_THAT(tool.Out(), HasSubstr("Exit codes:"));
-    for (const Arguments& command : std::vector<Arguments>{{}, {"readout"}, {"eeprom", "check"}}) {
-        Arguments arguments = command;
-        arguments.push_back("--help");
-        tool.Run(arguments);
+    for (const std::string command : {"", "readout", "eeprom check"}) {
+        tool.Run(command + " --help");
         const std::string help = tool.Out();
-        arguments.pop_back();
-        arguments.insert(arguments.begin(), "help");
-        EXPECT_EQ(tool.Run(arguments), ExitCode::Success);
+        EXPECT_EQ(tool.Run("help " + command), ExitCode::Success);
         EXPECT_EQ(tool.Out(), help);
     }
-    EXPECT_EQ(tool.Run({"--version"}), ExitCode::Success);
+    EXPECT_EQ(tool.Run("--version"), ExitCode::Success);
     EXPECT_THAT(tool.Out(), testing::MatchesRegex("ostra [0-9.]+\n"));
 }
 
 #if !defined(_WIN32)
 TEST(CommandLineTest, AWrongOneLeavesTheCaptureFileThatIsThere) {
-    const TestFolder folder;
-    const std::string file = folder.Path("capture");
-    WriteFile(file, {1});
     ToolRunner tool;
-    for (const Arguments& arguments : std::vector<Arguments>{{"readout", "--no-such-option"},
-                                                             {"scan", "--record-size", "7"},
-                                                             {"calibration", "set", "1211"},
-                                                             {"readout", "--device", "nobody"}}) {
-        Arguments withCapture{"--capture", file};
-        withCapture.insert(withCapture.end(), arguments.begin(), arguments.end());
-        EXPECT_NE(tool.Run(withCapture), ExitCode::Success) << testing::PrintToString(arguments);
-        EXPECT_EQ(ReadFile(file), std::vector<std::uint8_t>{1}) << testing::PrintToString(arguments);
+    const std::string file = tool.folder.Path("capture");
+    WriteFile(file, {1});
+    for (const std::string command : {"readout --no-such-option", "scan --record-size 7",
+                                      "calibration set 1211", "readout --device nobody"}) {
+        EXPECT_NE(tool.Run("--capture @capture " + command), ExitCode::Success) << command;
+        EXPECT_EQ(ReadFile(file), std::vector<std::uint8_t>{1}) << command;
     }
 }
 #endif

@@ -22,10 +22,8 @@ TEST(FileNames, AreQuotedAsTheShellReadsThem) {
 
 class RegisterTest : public testing::Test {
   protected:
-    ExitCode Register(std::vector<std::string> arguments) {
-        arguments.insert(arguments.begin(), "register");
-        arguments.insert(arguments.end(), {"--file", file_});
-        return tool_.Run(arguments);
+    ExitCode Register(const std::string& line) {
+        return tool_.Run("register " + line + " --file @rules.d/70-ostra.rules");
     }
     std::string Rules() {
         const auto bytes = ReadFile(file_);
@@ -33,8 +31,7 @@ class RegisterTest : public testing::Test {
     }
 
     ToolRunner tool_;
-    TestFolder folder_;
-    const std::string file_ = folder_.Path("rules.d/70-ostra.rules");
+    const std::string file_ = tool_.folder.Path("rules.d/70-ostra.rules");
 };
 
 /// The rule of one kind of device, as it is written now or was once.
@@ -47,28 +44,28 @@ std::string Rule(const std::string& vendor, const std::string& product,
 
 TEST_F(RegisterTest, WritesARuleForEachKindOnceAndTakesItBack) {
     for (const char* id : {"1209:00AB", "04b4:1003", "1209:00ab"}) {
-        ASSERT_EQ(Register({id}), ExitCode::Success) << tool_.Err();
+        ASSERT_EQ(Register(id), ExitCode::Success) << tool_.Err();
     }
     EXPECT_EQ(Rules().substr(Rules().find("SUBSYSTEM")), Rule("1209", "00ab") + Rule("04b4", "1003"));
-    EXPECT_EQ(Register({"1209:0002", "--remove"}), ExitCode::NoInstrument);
-    EXPECT_EQ(Register({"1209:00ab", "--remove"}), ExitCode::Success);
+    EXPECT_EQ(Register("1209:0002 --remove"), ExitCode::NoInstrument);
+    EXPECT_EQ(Register("1209:00ab --remove"), ExitCode::Success);
     EXPECT_EQ(Rules().substr(Rules().find("SUBSYSTEM")), Rule("04b4", "1003"));
-    EXPECT_EQ(Register({"04b4:1003", "--remove"}), ExitCode::Success);
+    EXPECT_EQ(Register("04b4:1003 --remove"), ExitCode::Success);
     EXPECT_FALSE(std::filesystem::exists(file_)) << "a rule file without rules is of no use";
 }
 
 TEST_F(RegisterTest, LeavesOtherRulesAlone) {
-    ASSERT_EQ(Register({"1209:0001"}), ExitCode::Success);
+    ASSERT_EQ(Register("1209:0001"), ExitCode::Success);
     std::string rules = Rules();
     rules.insert(rules.size() - 1, ", SYMLINK+=\"meter\"");
     const std::string others = "# mine\nSUBSYSTEM==\"tty\", MODE=\"0666\"\n # " + Rule("1209", "0001");
     const auto both = rules + others;
     WriteFile(file_, {both.begin(), both.end()});
-    EXPECT_EQ(Register({"1209:0001"}), ExitCode::Success);
+    EXPECT_EQ(Register("1209:0001"), ExitCode::Success);
     EXPECT_EQ(Rules(), both);
-    EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success);
+    EXPECT_EQ(Register("1209:0001 --remove"), ExitCode::Success);
     EXPECT_EQ(Rules(), rules.substr(0, rules.find("SUBSYSTEM")) + others);
-    EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::NoInstrument) << "a comment is no rule";
+    EXPECT_EQ(Register("1209:0001 --remove"), ExitCode::NoInstrument) << "a comment is no rule";
 }
 
 TEST_F(RegisterTest, KnowsTheRulesOfOlderVersions) {
@@ -78,25 +75,25 @@ TEST_F(RegisterTest, KnowsTheRulesOfOlderVersions) {
         Rule("1209", "0001", "\n") + Rule("1209", "0002", "\n");
     std::filesystem::create_directories(std::filesystem::path(file_).parent_path());
     WriteFile(file_, {old.begin(), old.end()});
-    ASSERT_EQ(Register({"1209:0002"}), ExitCode::Success) << tool_.Err();
+    ASSERT_EQ(Register("1209:0002"), ExitCode::Success) << tool_.Err();
     EXPECT_EQ(Rules().substr(Rules().find("SUBSYSTEM")), Rule("1209", "0001", "\n") + Rule("1209", "0002"));
     EXPECT_NE(Rules().find("the group its members"), std::string::npos) << Rules();
     WriteFile(file_, {old.begin(), old.end()});
-    EXPECT_EQ(Register({"1209:0001", "--remove"}), ExitCode::Success) << tool_.Err();
-    EXPECT_EQ(Register({"1209:0002", "--remove"}), ExitCode::Success) << tool_.Err();
+    EXPECT_EQ(Register("1209:0001 --remove"), ExitCode::Success) << tool_.Err();
+    EXPECT_EQ(Register("1209:0002 --remove"), ExitCode::Success) << tool_.Err();
     EXPECT_FALSE(std::filesystem::exists(file_)) << Rules();
 }
 
 TEST_F(RegisterTest, DryRunsAndMistakesChangeNothing) {
-    EXPECT_EQ(Register({"1209:0001", "--dry-run"}), ExitCode::Success);
+    EXPECT_EQ(Register("1209:0001 --dry-run"), ExitCode::Success);
     EXPECT_NE(tool_.Out().find("ATTR{idProduct}==\"0001\""), std::string::npos) << tool_.Out();
     EXPECT_FALSE(std::filesystem::exists(file_));
-    ASSERT_EQ(Register({"1209:0001"}), ExitCode::Success);
+    ASSERT_EQ(Register("1209:0001"), ExitCode::Success);
     const std::string before = Rules();
-    EXPECT_EQ(Register({"1209:0001", "--remove", "--dry-run"}), ExitCode::Success);
+    EXPECT_EQ(Register("1209:0001 --remove --dry-run"), ExitCode::Success);
     EXPECT_NE(tool_.Out().find("would remove"), std::string::npos) << tool_.Out();
-    for (const char* id : {"1209", "1209:1", "1209-0001", "1209:000g", "1209:00011", "\"1209:0001", ""}) {
-        EXPECT_EQ(Register({id}), ExitCode::Usage) << id;
+    for (const char* id : {"1209", "1209:1", "1209-0001", "1209:000g", "1209:00011", "\"1209:0001", "''"}) {
+        EXPECT_EQ(Register(id), ExitCode::Usage) << id;
     }
     EXPECT_EQ(Rules(), before);
 }

@@ -120,23 +120,6 @@ TEST(ProgressTest, Lines) {
     }
 }
 
-TEST(ProgressTest, SilentUnlessOnATerminalAndGoneAtTheEnd) {
-    StreamFacts facts;
-    facts.isTerminal = true;
-    std::ostringstream plain, terminal;
-    { ProgressLine(plain, facts, "w", 2, "pieces").Update(2); }
-    EXPECT_EQ(plain.str(), "") << "cannot be drawn on";
-    facts.movesCursor = true;
-    facts.size = [] { return TerminalSize{10, 24}; };
-    {
-        ProgressLine progress(terminal, facts, "w", 2, "pieces");
-        progress.Update(2);
-        EXPECT_TRUE(terminal.str().ends_with("\rw  2 of 2")) << terminal.str();
-        terminal.str({});
-    }
-    EXPECT_EQ(terminal.str(), "\r" + std::string(9, ' ') + "\r") << "the line stays";
-}
-
 TEST(LiveBlockTest, IsDrawnAnewWhereTheTerminalHasChanged) {
     StreamFacts facts;
     facts.isTerminal = facts.movesCursor = true;

@@ -1,5 +1,3 @@
-#include "Output/RecordWriter.h"
-#include "Output/StreamOutput.h"
 #include "Platform/EventScheduler.h"
 #include "Protocol/ByteOrder.h"
 #include "ToolFixture.h"
@@ -21,10 +19,8 @@ Simulator::InstrumentSettings Streaming(std::uint64_t bytes, std::uint64_t bytes
 
 class ScanTest : public ToolTest {
   protected:
-    std::vector<std::uint8_t> ScanRaw(Arguments arguments) {
-        arguments.insert(arguments.begin(), "scan");
-        arguments.insert(arguments.end(), {"--raw", "--output", folder_.Path("raw")});
-        Succeed(arguments);
+    std::vector<std::uint8_t> ScanRaw(const std::string& options) {
+        Succeed("scan --raw --output @raw " + options);
         return ReadFile(folder_.Path("raw"));
     }
     /// For a text in which a question mark is any character.
@@ -44,22 +40,22 @@ OSTRA_ON_BOTH_TRANSPORTS(ScanTest);
 TEST_P(ScanTest, FixedScansHaveTheirSize) {
     host_.Add("sim", Streaming(10'000'000));
     for (const std::size_t records : {1u, 2u, 11u, 300u, 1000u}) {
-        const auto bytes = ScanRaw({"--records", std::to_string(records)});
+        const auto bytes = ScanRaw("--records " + std::to_string(records));
         EXPECT_EQ(bytes.size(), records * RecordSize);
         ExpectRecordsInOrder(bytes);
     }
-    EXPECT_EQ(ScanRaw({"--total", "5120"}).size(), 5120u);
+    EXPECT_EQ(ScanRaw("--total 5120").size(), 5120u);
     if (GetParam() == Transport::UsbIo) {
-        EXPECT_EQ(ScanRaw({"--total", "1000"}).size(), 1000u);
+        EXPECT_EQ(ScanRaw("--total 1000").size(), 1000u);
     } else {
-        Fail({"scan", "--total", "1000"}, ExitCode::Usage, "1000 is none of 256");
+        Fail("scan --total 1000", ExitCode::Usage, "1000 is none of 256");
     }
 }
 
 TEST_P(ScanTest, OpenEndedScansEndWithTheInstrument) {
     for (const std::size_t records : {1u, 40u, 2560u}) {
         host_.Add("sim", Streaming(records * RecordSize));
-        const auto bytes = ScanRaw({});
+        const auto bytes = ScanRaw("");
         EXPECT_EQ(bytes.size(), records * RecordSize);
         ExpectRecordsInOrder(bytes);
     }
@@ -67,7 +63,7 @@ TEST_P(ScanTest, OpenEndedScansEndWithTheInstrument) {
 
 TEST_P(ScanTest, CsvHasTheNumbersAndTheColumnsThatAreAskedFor) {
     host_.Add("sim", Streaming(8 * RecordSize, 2048));
-    const auto bytes = ScanRaw({});
+    const auto bytes = ScanRaw("");
     std::string values, names;
     for (std::size_t i = 0; i < RecordSize; i += 2) {
         const int value = Protocol::LoadBig16(bytes.data() + i);
@@ -77,21 +73,18 @@ TEST_P(ScanTest, CsvHasTheNumbersAndTheColumnsThatAreAskedFor) {
     // The first transfer holds two records, or all of them.
     const std::string when = GetParam() == Transport::Native ? "0.2??," : "1.0??,";
     struct Case {
-        Arguments options;
-        std::string head, first;
+        std::string options, head, first;
     };
     for (const Case& row : {
-             Case{{}, "", values},
-             Case{{"--output", "-"}, "", values},
-             Case{{"--header"}, names, values},
-             Case{{"--header", "--number"}, "record," + names, "1," + values},
-             Case{{"--header", "--time"}, "seconds," + names, when + values},
-             Case{{"--number", "--time"}, "", "1," + when + values},
+             Case{"", "", values},
+             Case{"--output -", "", values},
+             Case{"--header", names, values},
+             Case{"--header --number", "record," + names, "1," + values},
+             Case{"--header --time", "seconds," + names, when + values},
+             Case{"--number --time", "", "1," + when + values},
          }) {
         host_.Add("sim", Streaming(8 * RecordSize, 2048));
-        Arguments arguments = row.options;
-        arguments.insert(arguments.begin(), "scan");
-        Succeed(arguments);
+        Succeed("scan " + row.options);
         EXPECT_THAT(tool_.Err(), HasSubstr("8 records of 256 bytes"));
         auto lines = tool_.Lines();
         if (!row.head.empty()) {
@@ -104,20 +97,35 @@ TEST_P(ScanTest, CsvHasTheNumbersAndTheColumnsThatAreAskedFor) {
     }
 }
 
+/// However the data are cut into transfers.
 TEST_P(ScanTest, OtherRecordSizes) {
     host_.Add("sim", Streaming(100'000));
-    Succeed({"scan", "--record-size", "8", "--records", "100"});
-    EXPECT_EQ(tool_.Lines().size(), 100u);
-    for (const std::string& line : tool_.Lines()) {
-        ASSERT_EQ(std::count(line.begin(), line.end(), ','), 3) << line;
+    const auto all = ScanRaw("--record-size 2");
+    ASSERT_EQ(all.size(), 100'000u);
+    for (const std::size_t recordSize : {8u, 254u, 6552u}) {
+        host_.Add("sim", Streaming(100'000));  // the same noise once more
+        const std::string options = "--record-size " + std::to_string(recordSize) + " --records " +
+                                    std::to_string(100'000 / recordSize);
+        const auto raw = ScanRaw(options);
+        EXPECT_EQ(raw.size(), 100'000 / recordSize * recordSize);
+        EXPECT_TRUE(std::equal(raw.begin(), raw.end(), all.begin())) << recordSize;
+        host_.Add("sim", Streaming(100'000));
+        Succeed("scan --number " + options);
+        std::string csv;
+        for (std::size_t i = 0; i < raw.size(); i += 2) {
+            const int value = Protocol::LoadBig16(raw.data() + i);
+            csv += i % recordSize == 0 ? std::to_string(i / recordSize + 1) + ',' : "";
+            csv += std::to_string(value > 0xF800 ? value - 0x10000 : value);
+            csv += (i + 2) % recordSize == 0 ? '\n' : ',';
+        }
+        EXPECT_EQ(tool_.Out(), csv);
     }
-    EXPECT_EQ(ScanRaw({"--record-size", "6553", "--records", "3"}).size(), 3u * 6553);
 }
 
 TEST_P(ScanTest, ProgressOnATerminalAndASummary) {
     tool_.errFacts.isTerminal = tool_.errFacts.movesCursor = true;
     host_.Add("sim", Streaming(1'000'000));
-    Succeed({"scan", "--total", "512000", "--json", "--output", folder_.Path("csv")});
+    Succeed("scan --total 512000 --json --output @csv");
     EXPECT_THAT(tool_.Err(), HasSubstr("512.0 kB of 512.0 kB"));
     EXPECT_EQ(tool_.Json()["records"], 2000);
     EXPECT_EQ(tool_.Json()["file"], folder_.Path("csv"));
@@ -128,7 +136,6 @@ TEST_P(ScanTest, ProgressOnATerminalAndASummary) {
 /// the exit code and the text say why it ended. The instrument can be used afterwards.
 TEST_P(ScanTest, WhatCameIsKept) {
     struct Case {
-        const char* name;
         const char* faults;
         std::function<void(Service::Interruption& user)> event;  ///< after 5 s
         ExitCode code;
@@ -136,28 +143,22 @@ TEST_P(ScanTest, WhatCameIsKept) {
         const char* text;
         bool hasRecords = true;
     };
+    const auto interrupt = [](Service::Interruption& user) { user.Request(); };
+    const auto unplug = [this](auto&) { host_.Bus().Unplug("sim"); };
     const std::vector<Case> cases{
-        {"interrupted", "", [](auto& user) { user.Request(); }, ExitCode::Interrupted, "interrupted",
-         "scan interrupted; "},
-        {"unplugged", "", [this](auto&) { host_.Bus().Unplug("sim"); }, ExitCode::NoInstrument, "unplugged",
-         ""},
-        {"silent", "bulk-in 4+:silent", {}, ExitCode::Timeout, "timeout", ""},
-        {"silent at once",
-         "bulk-in 0+:silent",
-         {},
-         ExitCode::Timeout,
-         "timeout",
-         "; nothing was recorded",
-         false},
-        {"failed", "bulk-in 4:stall", {}, ExitCode::InputOutput, "failed", ""},
-        {"short", "bulk-in 4:short=1000", {}, ExitCode::InputOutput, "short", " of 6400000 bytes came; "},
+        {"", interrupt, ExitCode::Interrupted, "interrupted", "scan interrupted; "},
+        {"", unplug, ExitCode::NoInstrument, "unplugged", ""},
+        {"bulk-in 4+:silent", {}, ExitCode::Timeout, "timeout", ""},
+        {"bulk-in 0+:silent", {}, ExitCode::Timeout, "timeout", "; nothing was recorded", false},
+        {"bulk-in 4:stall", {}, ExitCode::InputOutput, "failed", ""},
+        {"bulk-in 4:short=1000", {}, ExitCode::InputOutput, "short", " of 6400000 bytes came; "},
     };
     for (const Case& row : cases) {
         for (const std::string how : {"there", "discarded", "open-ended"}) {
             if (how == "open-ended" && std::string(row.ended) == "short") {
                 continue;  // it is as long as the instrument makes it
             }
-            SCOPED_TRACE(row.name + (", " + how));
+            SCOPED_TRACE(std::string(row.ended) + ", " + how + " " + row.faults);
             auto& instrument = host_.Add("sim", Streaming(100'000'000, 100'000));
             SetFaults(row.faults);
             if (how == "there") {
@@ -166,15 +167,11 @@ TEST_P(ScanTest, WhatCameIsKept) {
             Service::Interruption interruption;
             tool_.interruption = &interruption;
             const auto event = After(5'000'000, [&] { row.event ? row.event(interruption) : void(); });
-            Arguments arguments{"scan", "--raw", "--json", "--timeout", "2", "--output", folder_.Path("raw")};
-            if (how == "discarded") {
-                arguments.push_back("--discard");
-            }
-            if (how != "open-ended") {
-                arguments.insert(arguments.end(), {"--records", "25000"});
-            }
             const Stopwatch watch(clock_);
-            Fail(arguments, row.code, row.text);
+            Fail(std::string("scan --raw --json --timeout 2 --output @raw") +
+                     (how == "discarded" ? " --discard" : "") +
+                     (how != "open-ended" ? " --records 25000" : ""),
+                 row.code, row.text);
             watch.ExpectAtMost(row.code == ExitCode::Interrupted ? 5'100 : 25'000);
             Platform::ClockScheduler().Forget(event);
             EXPECT_EQ(tool_.Json()["ended"], row.ended);
@@ -200,9 +197,9 @@ TEST_P(ScanTest, WhatCameIsKept) {
             EXPECT_EQ(instrument.PendingTransfers(), 0u);
             EXPECT_FALSE(instrument.Claimed());
             tool_.interruption = nullptr;
-            if (std::string(row.name) == "interrupted") {
+            if (row.code == ExitCode::Interrupted) {
                 EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 2u);
-                Succeed({"readout"});
+                Succeed("readout");
             }
         }
     }
@@ -218,7 +215,7 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
         tool_.interruption = &interruption;
         const auto event = After(after * 1000, [&] { interruption.Request(); });
         const Stopwatch watch(clock_);
-        const ExitCode code = tool_.Run({"scan", "--raw", "--output", folder_.Path("raw")});
+        const ExitCode code = tool_.Run("scan --raw --output @raw");
         Platform::ClockScheduler().Forget(event);
         watch.ExpectAtMost(code == ExitCode::Interrupted ? after + 50 : 8'000);
         EXPECT_TRUE(code == ExitCode::Interrupted || code == ExitCode::Success) << tool_.Err();
@@ -234,45 +231,7 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
     }
     EXPECT_GT(interrupted, 20);
     tool_.interruption = nullptr;
-    Succeed({"scan", "--output", folder_.Path("csv")});
-}
-
-/// However the data are cut into transfers.
-TEST(ScanRecorderTest, RecordsArePutTogetherFromTransfers) {
-    std::vector<std::uint8_t> data(100'001);
-    for (std::size_t i = 0; i < data.size(); ++i) {
-        data[i] = static_cast<std::uint8_t>(i * i / 7 + i / 251);
-    }
-    for (const std::uint32_t recordSize : {2u, 8u, 254u, 6552u}) {
-        const std::size_t whole = data.size() / recordSize * recordSize;
-        const std::string raw(data.begin(), data.begin() + static_cast<std::ptrdiff_t>(whole));
-        std::string csv;
-        for (std::size_t i = 0; i < whole; i += 2) {
-            const int value = Protocol::LoadBig16(data.data() + i);
-            csv += i % recordSize == 0 ? std::to_string(i / recordSize + 1) + ',' : "";
-            csv += std::to_string(value > 0xF800 ? value - 0x10000 : value);
-            csv += (i + 2) % recordSize == 0 ? '\n' : ',';
-        }
-        for (const std::size_t transfer : {1u, 255u, 256u, 100'001u}) {
-            for (const bool isRaw : {false, true}) {
-                SCOPED_TRACE(std::to_string(recordSize) + " from " + std::to_string(transfer));
-                std::ostringstream stream;
-                Cli::StreamOutput output(stream);
-                std::uint64_t told = 0;
-                Cli::RecordWriter writer({recordSize, isRaw, false, {true, false}}, output);
-                Service::ScanRecorder recorder(recordSize, writer,
-                                               [&told](std::uint64_t bytes) { told = bytes; });
-                for (std::size_t i = 0; i < data.size(); i += transfer) {
-                    recorder.Receive(std::span(data).subspan(i, std::min(transfer, data.size() - i)));
-                }
-                EXPECT_EQ(stream.str(), isRaw ? raw : csv);
-                EXPECT_EQ(output.Records(), data.size() / recordSize);
-                EXPECT_EQ(recorder.LeftOver().size(), data.size() - whole);
-                EXPECT_EQ(recorder.Received(), data.size());
-                EXPECT_GT(told, data.size() - recordSize);
-            }
-        }
-    }
+    Succeed("scan --output @csv");
 }
 
 }  // namespace

@@ -16,12 +16,18 @@
 
 namespace Varnholt::Tests {
 
-using Arguments = std::vector<std::string>;
-
 /// Runs the tool in this process. The streams say that they are no terminals, unless a test says otherwise.
 class ToolRunner {
   public:
-    Cli::ExitCode Run(const Arguments& arguments) {
+    /// The words of a command line; "@NAME" is a file in the folder, "''" an empty word.
+    Cli::ExitCode Run(const std::string& line) {
+        std::vector<std::string> arguments;
+        std::istringstream words(line);
+        for (std::string word; words >> word;) {
+            arguments.push_back(word == "''"            ? ""
+                                : word.starts_with('@') ? folder.Path(word.substr(1))
+                                                        : word);
+        }
         out_.str({});
         err_.str({});
         log_.str({});
@@ -45,6 +51,7 @@ class ToolRunner {
         return lines;
     }
 
+    const TestFolder folder{};
     Cli::StreamFacts outFacts, errFacts;
     std::uint32_t inputPatience = 30'000;
     Service::Interruption* interruption = nullptr;
@@ -57,13 +64,13 @@ class ToolRunner {
 class ToolTest : public testing::TestWithParam<Transport> {
   protected:
     /// Succeeds, or the test fails with what the tool said.
-    void Succeed(const Arguments& arguments) {
-        EXPECT_EQ(tool_.Run(arguments), Cli::ExitCode::Success) << tool_.Err();
+    void Succeed(const std::string& line) {
+        EXPECT_EQ(tool_.Run(line), Cli::ExitCode::Success) << line << ": " << tool_.Err();
     }
     /// Fails with this code, and tells the user of it with `text`.
-    void Fail(const Arguments& arguments, Cli::ExitCode code, const std::string& text = "") {
-        EXPECT_EQ(tool_.Run(arguments), code) << testing::PrintToString(arguments) << ": " << tool_.Err();
-        EXPECT_THAT(tool_.Err(), testing::HasSubstr(text)) << testing::PrintToString(arguments);
+    void Fail(const std::string& line, Cli::ExitCode code, const std::string& text = "") {
+        EXPECT_EQ(tool_.Run(line), code) << line << ": " << tool_.Err();
+        EXPECT_THAT(tool_.Err(), testing::HasSubstr(text)) << line;
     }
     std::string Identifier(const std::string& name = "sim") const { return host_.Identifier(name); }
     void SetFaults(const std::string& plan) {
@@ -84,7 +91,7 @@ class ToolTest : public testing::TestWithParam<Transport> {
     TestClock clock_{TestTime::Virtual};
     SimulatedHost host_{GetParam()};
     ToolRunner tool_;
-    TestFolder folder_;
+    const TestFolder& folder_ = tool_.folder;
 };
 
 inline std::string NameOfTransport(const testing::TestParamInfo<Transport>& info) {

@@ -31,48 +31,39 @@ enum class Data {
 
 struct Command {
     const char* name;
-    std::vector<std::string> arguments;  ///< "@NAME": a file in the test's folder
+    const char* line;
     Data data;
     const char* recording = nullptr;  ///< of records of `RecordSize` bytes
     bool showsEvents = false;         ///< a removal is one, and a success
 };
 
-const std::vector<Command>& Commands() {
-    static const std::vector<Command> commands{
-        {"ListChipIds", {"list", "--chip-id"}, Data::Trusted},
-        {"IdentifyChip", {"identify", "--device", "chip:5a0123456789abcd"}, Data::Trusted},
-        {"Reset", {"reset"}, Data::Trusted},
-        {"Readout", {"readout"}, Data::Trusted},
-        {"ReadoutInTime", {"readout", "--integration-time", "0.01"}, Data::Trusted},
-        {"Scan",
-         {"scan", "--record-size", "5000", "--records", "30", "--timeout", "1", "--raw", "-o", "@scan"},
-         Data::Trusted,
-         "scan"},
-        {"OpenScan",
-         {"scan", "--record-size", "5000", "--timeout", "1", "--raw", "-o", "@scan"},
-         Data::TrustedOpen,
-         "scan"},
-        {"Monitor", {"monitor", "--for", "0.1"}, Data::Trusted, nullptr, true},
-        {"Backup", {"eeprom", "backup", "@new"}, Data::Checked},
-        {"Show", {"eeprom", "show"}, Data::Checked},
-        {"Check", {"eeprom", "check"}, Data::Checked},
-        {"Diff", {"eeprom", "diff", "@image"}, Data::Checked},
-        {"Write", {"eeprom", "write", "@image", "--backup", "@backup"}, Data::Checked},
-        {"Restore", {"eeprom", "restore", "@image"}, Data::Checked},
-        {"WriteImage", {"write-image", "@image"}, Data::Checked},
-        {"CalibrationShow", {"calibration", "show"}, Data::Checked},
-        {"CalibrationSet", {"calibration", "set", "1211=5", "--backup", "@backup"}, Data::Checked},
-        {"LogShow", {"log", "show"}, Data::Checked},
-        {"LogReset", {"log", "reset", "--backup", "@backup"}, Data::Checked},
-        {"BinaryGet", {"binary", "get", "@new"}, Data::Checked},
-        {"BinaryPut", {"binary", "put", "@block", "--backup", "@backup"}, Data::Checked},
-        {"WordGet", {"word", "get", "10200"}, Data::Checked},
-        {"WordPut", {"word", "put", "10200=7", "--backup", "@backup"}, Data::Checked},
-        {"RamShow", {"ram", "show"}, Data::Trusted},
-        {"RamSet", {"ram", "set", "2009=0.02"}, Data::Trusted},
-    };
-    return commands;
-}
+constexpr Command Commands[] = {
+    {"ListChipIds", "list --chip-id", Data::Trusted},
+    {"IdentifyChip", "identify --device chip:5a0123456789abcd", Data::Trusted},
+    {"Reset", "reset", Data::Trusted},
+    {"Readout", "readout", Data::Trusted},
+    {"ReadoutInTime", "readout --integration-time 0.01", Data::Trusted},
+    {"Scan", "scan --record-size 5000 --records 30 --timeout 1 --raw -o @scan", Data::Trusted, "scan"},
+    {"OpenScan", "scan --record-size 5000 --timeout 1 --raw -o @scan", Data::TrustedOpen, "scan"},
+    {"Monitor", "monitor --for 0.1", Data::Trusted, nullptr, true},
+    {"Backup", "eeprom backup @new", Data::Checked},
+    {"Show", "eeprom show", Data::Checked},
+    {"Check", "eeprom check", Data::Checked},
+    {"Diff", "eeprom diff @image", Data::Checked},
+    {"Write", "eeprom write @image --backup @backup", Data::Checked},
+    {"Restore", "eeprom restore @image", Data::Checked},
+    {"WriteImage", "write-image @image", Data::Checked},
+    {"CalibrationShow", "calibration show", Data::Checked},
+    {"CalibrationSet", "calibration set 1211=5 --backup @backup", Data::Checked},
+    {"LogShow", "log show", Data::Checked},
+    {"LogReset", "log reset --backup @backup", Data::Checked},
+    {"BinaryGet", "binary get @new", Data::Checked},
+    {"BinaryPut", "binary put @block --backup @backup", Data::Checked},
+    {"WordGet", "word get 10200", Data::Checked},
+    {"WordPut", "word put 10200=7 --backup @backup", Data::Checked},
+    {"RamShow", "ram show", Data::Trusted},
+    {"RamSet", "ram set 2009=0.02", Data::Trusted},
+};
 
 /// The image that is written: the fresh one with a difference in several pieces.
 Bytes ImageToWrite() {
@@ -95,7 +86,7 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
     };
 
     const Transport transport_ = std::get<0>(GetParam());
-    const Command& command_ = Commands()[std::get<1>(GetParam())];
+    const Command& command_ = Commands[std::get<1>(GetParam())];
 
     static Files FilesIn(const TestFolder& folder) {
         Files files;
@@ -111,21 +102,16 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
         Simulator::InstrumentSettings settings;
         settings.scanBytes = command_.recording != nullptr ? 30 * RecordSize : Protocol::ReadoutBytes;
         auto& instrument = host.Add("sim", settings);
-        const TestFolder folder;
+        ToolRunner tool;
+        const TestFolder& folder = tool.folder;
         WriteFile(folder.Path("image"), ImageToWrite());
         WriteFile(folder.Path("block"), Bytes(Service::BinaryBlockOf(ImageToWrite()).size(), 0x3C));
         const auto script = host.Bus().SetFaults("sim", plan);
-        Arguments arguments;
-        for (const std::string& argument : command_.arguments) {
-            arguments.push_back(argument.starts_with('@') ? folder.Path(argument.substr(1)) : argument);
-        }
-
         Result result;
         result.filesBefore = FilesIn(folder);
         result.memoryBefore = instrument.Eeprom();
-        ToolRunner tool;
         const Stopwatch stopwatch(clock);
-        result.code = tool.Run(arguments);
+        result.code = tool.Run(command_.line);
         stopwatch.ExpectAtMost(90'000);
         result.out = tool.Out();
         result.err = tool.Err();
@@ -265,10 +251,10 @@ TEST_P(ToolSweep, SucceedsWholeOrFailsWithNothingLost) {
 
 INSTANTIATE_TEST_SUITE_P(All, ToolSweep,
                          testing::Combine(testing::Values(Transport::Native, Transport::UsbIo),
-                                          testing::Range<std::size_t>(0, Commands().size())),
+                                          testing::Range<std::size_t>(0, std::size(Commands))),
                          [](const auto& parameter) {
                              return std::string(Name(std::get<0>(parameter.param))) + "_" +
-                                    Commands()[std::get<1>(parameter.param)].name;
+                                    Commands[std::get<1>(parameter.param)].name;
                          });
 
 }  // namespace
