@@ -8,15 +8,12 @@
 
 #include "EachClock.h"
 #include "Platform/EventScheduler.h"
-#include "Support/ResourceCount.h"
 #include "TestThread.h"
 
 namespace Varnholt::Platform {
 namespace {
 
 using testing::ElementsAre;
-using TestSupport::ResourceCount;
-
 using Schedulers = EachClock;
 INSTANTIATE_FOR_EACH_CLOCK(Schedulers);
 
@@ -79,21 +76,6 @@ TEST_P(Schedulers, ForgetReturnsAfterACallThatIsRunning) {
         scheduler.Forget(id);
         EXPECT_TRUE(over);
     });
-}
-
-/// Without events there is no thread, however they went.
-TEST_P(Schedulers, LeaveNoThreadBehind) {
-    EventScheduler& scheduler = ClockScheduler();
-    const OwnedHandle done(MakeAutoResetEvent());
-    TestThread([] {}).Join();  // a sanitizer starts a thread of its own with the first
-    const ResourceCount before = ResourceCount::TakeSettled();
-    for (int i = 0; i < 20; ++i) {
-        scheduler.CallAt(scheduler.Now() + 500, [&] { SignalEvent(done.Get()); });
-        EXPECT_EQ(Wait(done.Get(), LongTimeout), WaitResult::Signalled);
-        EXPECT_TRUE(before.Settles()) << "after a call";
-        scheduler.Forget(scheduler.CallAt(scheduler.Now() + 60'000'000, [] {}));
-        EXPECT_TRUE(before.Settles()) << "after an event was forgotten";
-    }
 }
 
 /// Events from several threads that come and go quickly, so that the scheduler's own thread does as well.

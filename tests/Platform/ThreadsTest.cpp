@@ -5,13 +5,10 @@
 #include "EachClock.h"
 #include "Platform/ErrorCodes.h"
 #include "Platform/Threads.h"
-#include "Support/ResourceCount.h"
 #include "TestThread.h"
 
 namespace Varnholt::Platform {
 namespace {
-
-using TestSupport::ResourceCount;
 
 using Threads = EachClock;
 INSTANTIATE_FOR_EACH_CLOCK(Threads);
@@ -68,23 +65,6 @@ TEST_P(Threads, EndByForceOrSayThatTheyCannot) {
     EXPECT_NE(left, isEnded);
     EXPECT_FALSE(EndThreadByForce(NoHandle, 0));
     EXPECT_EQ(LastError(), Errors::InvalidHandle);
-}
-
-TEST_P(Threads, LeaveNothingBehind) {
-    std::atomic<bool> warmUp = false;
-    Wait(OwnedHandle(StartThread(SetFlagLater, &warmUp)).Get(), LongTimeout);
-    const ResourceCount before = ResourceCount::TakeSettled();
-    for (int i = 0; i < 50; ++i) {
-        std::atomic<bool> waitedFor = false;
-        std::atomic<bool> closedAtOnce = false;
-        const OwnedHandle thread(StartThread(SetFlagLater, &waitedFor));
-        Close(StartThread(SetFlagLater, &closedAtOnce));
-        EXPECT_EQ(Wait(thread.Get(), LongTimeout), WaitResult::Signalled);
-        while (!closedAtOnce) {
-            SleepMilliseconds(1);
-        }
-    }
-    EXPECT_TRUE(before.Settles()) << before << " before, " << ResourceCount::Take() << " after";
 }
 
 }  // namespace

@@ -99,6 +99,7 @@ TEST_F(UsbIpServerTest, InstrumentsAreListedByNameForAsLongAsTheyAreThere) {
     const auto before = TestSupport::ResourceCount::TakeSettled();
     for (int round = 0; round < 3; ++round) {
         EXPECT_TRUE(Listed(name_));
+        OpenAndClaim(name_);
         const SimulatorInfo info = Describe(name_);
         EXPECT_TRUE(info.usable && info.answers);
         EXPECT_EQ(getpid(), info.processId);

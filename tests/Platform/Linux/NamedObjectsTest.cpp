@@ -8,14 +8,11 @@
 
 #include "ForkedProcess.h"
 #include "Platform/Threads.h"
-#include "Support/ResourceCount.h"
 #include "TestThread.h"
 #include "UniqueName.h"
 
 namespace Varnholt::Platform {
 namespace {
-
-using TestSupport::ResourceCount;
 
 std::string NameOfThisTest() {
     return UniqueName(testing::UnitTest::GetInstance()->current_test_info()->name());
@@ -119,23 +116,6 @@ TEST(NamedMutexes, AreOneHoweverTheyComeAndGo) {
     std::ifstream(path) >> count;
     std::remove(path.c_str());
     EXPECT_EQ(count, (Processes + 1) * Rounds);
-}
-
-TEST(NamedObjects, LeaveNothingBehind) {
-    const auto use = [] {
-        const OwnedHandle mutex(MakeMutex(NameOfThisTest()));
-        const OwnedHandle again(MakeMutex(NameOfThisTest()));
-        const OwnedHandle semaphore(MakeSemaphore(0, 1, NameOfThisTest() + ".semaphore"));
-        // Whoever owns a mutex when its last handle goes does not keep it.
-        EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
-    };
-    TestThread(use).Join();  // a sanitizer starts a thread of its own with the first
-    const ResourceCount before = ResourceCount::TakeSettled();
-    for (int i = 0; i < 20; ++i) {
-        use();
-    }
-    TestThread(use).Join();
-    EXPECT_TRUE(before.Settles()) << before << " before, " << ResourceCount::Take() << " after";
 }
 
 }  // namespace
