@@ -1,5 +1,6 @@
-// Every kind of operation of the library, on both transports, with every fault at every transfer: the outcome
-// is a documented one, within a bounded time, and the instrument can be opened again.
+// Scans, the exports and the memory model, on both transports, with every fault at every transfer: the
+// outcome is a documented one, within a bounded time, the instrument can be opened again, and whatever fails,
+// a log is left in its memory and nothing else is touched.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
@@ -7,32 +8,61 @@
 #include <array>
 #include <cstdlib>
 #include <functional>
-#include <iterator>
 #include <numeric>
 #include <optional>
 #include <regex>
 #include <span>
+#include <string>
+#include <utility>
+#include <vector>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
-#include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
+#include "DeviceDriver/Ostra/LowLevel/PellandoRAM.h"
 #include "FaultInjector.h"
-#include "Operation.h"
+#include "FaultPlan.h"
+#include "FreshEeprom.h"
 #include "ostra.h"
+#include "Protocol/ByteOrder.h"
+#include "Protocol/EepromMap.h"
 #include "Protocol/Instrument.h"
 #include "Support/SimulatedHost.h"
 #include "Support/TestClock.h"
 #include "TransferRecorder.h"
+#include "Utilities/Exceptions/Exceptions.h"
 
 namespace Varnholt::Tests {
 namespace {
 
 using DeviceDriver::Generic::Utilities::DeviceDriverException;
-using DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
 using Platform::Usb::TransferStatus;
 using Simulator::Fault;
 using Simulator::FaultKind;
 using Simulator::FaultPlan;
 using Simulator::RecordedTransfer;
+using namespace DeviceDriver::Generic::Configuration;
+using namespace DeviceDriver::Ostra::LowLevel;
+using Commands = Utilities::Tools::SmartPointer<PellandoFunctionality>;
+namespace Map = Protocol::EepromMap;
+
+/// What came out of one run: nothing, or the text of what failed.
+using Outcome = std::optional<std::string>;
+using Bytes = std::vector<std::uint8_t>;
+
+/// One operation of the library, to be run with faults.
+struct Operation {
+    const char* name;
+    /// Opens the instrument, does its work, closes it.
+    std::function<Outcome()> run;
+    std::uint64_t scanBytes = Protocol::ReadoutBytes;
+    /// As an open-ended scan does, so that it cannot tell a fault from its end.
+    bool endsWithShortTransfer = false;
+
+    /// The EEPROM before each run, and what must hold of it after one with `fault` at a transfer of
+    /// `endpoint`. Empty: it does not matter.
+    Bytes eeprom = {};
+    std::function<void(const Bytes& after, const Simulator::Fault& fault, std::uint8_t endpoint)> check = {};
+};
 
 constexpr std::uint32_t ScanRecord = 1000;
 constexpr std::uint32_t ScanTotal = 100000;
@@ -41,68 +71,174 @@ constexpr std::uint64_t OpenScanTotal = 155'000;
 /// for.
 constexpr std::uint64_t TimeLimit = 40'000;  // ms
 
-/// An operation on an opened instrument; other exceptions than the documented ones end the test.
-std::function<Outcome()> OnInstrument(std::function<void(PellandoFunctionality&)> work) {
+/// Ends with what was thrown, or with why the log was lost.
+std::function<Outcome()> Caught(std::function<void(Outcome& lost)> work) {
     return [work = std::move(work)]() -> Outcome {
+        Outcome lost;
         try {
-            PellandoFunctionality instrument(nullptr, 0);
-            work(instrument);
-            return std::nullopt;
-        } catch (const DeviceDriverException& exception) {
+            work(lost);
+        } catch (const Utilities::Exceptions::TraceableException& exception) {
             return std::string(exception.what());
         }
+        return lost;
     };
 }
 
-void RunScan(PellandoFunctionality& instrument, std::uint32_t total) {
-    instrument.StartScan(ScanRecord, 1, total);
-    std::vector<std::uint8_t> record(ScanRecord);
-    for (std::uint32_t size = ScanRecord; size > 0;) {
-        instrument.GetScanData(record.data(), size);
-    }
+Outcome LastErrorUnless(bool isSuccess) {
+    return isSuccess ? Outcome() : Outcome(b5ae189db26b2a1b("LastError"));
 }
 
-const std::vector<std::uint8_t>& Image() {
-    static const std::vector<std::uint8_t> image(OSTRA_IMAGE_SIZE, 0x5A);
+Outcome Readout() {
+    std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
+    const std::int32_t code = d4fb86cecc88582a(values.data(), "");
+    EXPECT_TRUE(code == OSTRA_OK || code == OSTRA_FAILURE) << code;
+    return LastErrorUnless(code == OSTRA_OK);
+}
+
+Outcome ImageWrite() {
+    const std::int32_t code = f3355d91d5df0e0b(Bytes(OSTRA_IMAGE_SIZE, 0x5A).data(), "");
+    EXPECT_TRUE(code == OSTRA_OK || code == OSTRA_UNKNOWN_FAILURE) << code;
+    return LastErrorUnless(code == OSTRA_OK);
+}
+
+/// `total` bytes; 0: until the instrument stops.
+std::function<Outcome()> Scan(std::uint32_t total) {
+    return Caught([total](Outcome&) {
+        PellandoFunctionality instrument(nullptr, 0);
+        instrument.StartScan(ScanRecord, 1, total);
+        Bytes record(ScanRecord);
+        for (std::uint32_t size = ScanRecord; size > 0;) {
+            instrument.GetScanData(record.data(), size);
+        }
+    });
+}
+
+struct Area {
+    std::uint32_t first, size;
+};
+
+std::uint32_t WordAt(const Bytes& image, std::uint32_t address) {
+    return Protocol::LoadBig32(&image[address]);
+}
+
+/// The checksum is the first word of a copy and the sum of all others.
+std::uint32_t ChecksumOf(const Bytes& image, std::uint32_t copy) {
+    std::uint32_t sum = 0;
+    for (std::uint32_t at = 4; at < Map::LogSize; at += 4) {
+        sum += WordAt(image, copy + at);
+    }
+    return sum;
+}
+
+bool HasValidLog(const Bytes& image, std::uint32_t copy) {
+    return WordAt(image, copy) == ChecksumOf(image, copy);
+}
+
+/// Both logs filled, and something recognisable where nobody writes.
+Bytes UsedImage() {
+    Bytes image = Simulator::FreshEeprom();
+    for (const std::uint32_t copy : {Map::MainLog, Map::LogCopy}) {
+        for (std::uint32_t at = 4; at < Map::LogSize; at += 4) {
+            Protocol::StoreBig32(&image[copy + at], at * at);
+        }
+        Protocol::StoreBig32(&image[copy], ChecksumOf(image, copy));
+    }
+    for (std::uint32_t at = Map::BinaryFirst; at < Map::LogCopy; ++at) {
+        image[at] = static_cast<std::uint8_t>(at);
+    }
     return image;
 }
 
-std::vector<Operation> CommandsAndExports() {
-    using P = PellandoFunctionality;
-    static std::array<std::uint8_t, Protocol::ReadoutBytes> readout;
-    static std::uint8_t byte;
-    static std::uint16_t word;
-    return {
-        {"MeasureRequest", OnInstrument([](P& i) { i.MeasureRequest(readout.data(), 256, 1); })},
-        {"SetMeasureParameters", OnInstrument([](P& i) { i.SetMeasureParameters(1, 2, 3, 4); })},
-        {"GetMISC", OnInstrument([](P& i) { i.GetMISC(byte, word, byte, word, word); })},
-        {"WriteEEPROM", OnInstrument([](P& i) { i.WriteEEPROM(100, std::vector<std::uint8_t>(300)); })},
-        {"ReadEEPROM", OnInstrument([](P& i) {
-             std::vector<std::uint8_t> data(100);
-             i.ReadEEPROM(0, data);
-         })},
-        {"FixedScan", OnInstrument([](P& i) { RunScan(i, ScanTotal); }), ScanTotal},
-        {"OpenScan", OnInstrument([](P& i) { RunScan(i, 0); }), OpenScanTotal, true},
-        {"ExportedReadout",
-         []() -> Outcome {
-             std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
-             const std::int32_t code = d4fb86cecc88582a(values.data(), "");
-             EXPECT_TRUE(code == OSTRA_OK || code == OSTRA_FAILURE) << code;
-             return code == OSTRA_OK ? Outcome() : Outcome(b5ae189db26b2a1b("LastError"));
-         }},
-        {"ExportedImageWrite",
-         []() -> Outcome {
-             const std::int32_t code = f3355d91d5df0e0b(Image().data(), "");
-             EXPECT_TRUE(code == OSTRA_OK || code == OSTRA_UNKNOWN_FAILURE) << code;
-             return code == OSTRA_OK ? Outcome() : Outcome(b5ae189db26b2a1b("LastError"));
-         }},
-    };
+/// Faults that change what arrives without anybody's notice.
+bool ChangesData(FaultKind kind) {
+    constexpr std::array kinds{FaultKind::Garbage, FaultKind::Flip, FaultKind::Stale, FaultKind::Short,
+                               FaultKind::Empty};
+    return std::ranges::find(kinds, kind) != kinds.end();
 }
 
+void CheckEeprom(const Bytes& before, const std::vector<Area>& written, const Bytes& after,
+                 const Fault& fault, std::uint8_t endpoint) {
+    if (endpoint == 0 && ChangesData(fault.kind)) {
+        return;  // an address that has changed on its way leads anywhere
+    }
+    for (std::uint32_t at = 0; at < after.size(); ++at) {
+        const bool mayChange = std::ranges::any_of(
+            written, [at](const Area& area) { return at >= area.first && at - area.first < area.size; });
+        if (after[at] != before[at] && !mayChange) {
+            ADD_FAILURE() << "address " << at << " has changed";
+            return;
+        }
+    }
+    if (!(fault.fromThenOn && ChangesData(fault.kind))) {
+        EXPECT_TRUE(HasValidLog(after, Map::MainLog) || HasValidLog(after, Map::LogCopy))
+            << "no copy of the log is left";
+    }
+}
+
+void StoreParameters(Outcome&) {
+    PellandoRAM ram(Commands(new PellandoFunctionality(nullptr, 0)));
+    Properties set("PhysicalConditions");
+    ram.Load(set);
+    set.SetProperty(2009, Property(0.005F));
+    ram.Store(set);
+}
+
+Operation Checked(const char* name, std::function<Outcome()> run, std::vector<Area> written) {
+    Operation operation{name, std::move(run)};
+    operation.eeprom = UsedImage();
+    operation.check = [before = operation.eeprom, written = std::move(written)](
+                          const Bytes& after, const Fault& fault, std::uint8_t endpoint) {
+        CheckEeprom(before, written, after, fault, endpoint);
+    };
+    return operation;
+}
+
+Operation OfModel(const char* name, std::function<void(PellandoEEPROM&)> work,
+                  const std::vector<Area>& written = {}) {
+    std::vector<Area> all = written;
+    all.insert(all.end(), {{Map::MainLog, Map::LogSize}, {Map::LogCopy, Map::LogSize}});
+    const auto onModel = [work = std::move(work)](Outcome& lost) {
+        PellandoEEPROM eeprom(Commands(new PellandoFunctionality(nullptr, 0)));
+        eeprom.ReportLostLog([&lost](const std::string& reason) { lost = reason; });
+        work(eeprom);
+    };
+    return Checked(name, Caught(onModel), std::move(all));
+}
+
+/// The readout and the image go through most of the commands, the memory model through the others.
 std::vector<Operation> Operations() {
-    std::vector<Operation> all = CommandsAndExports();
-    std::ranges::move(MemoryOperations(), std::back_inserter(all));
-    return all;
+    return {
+        {"FixedScan", Scan(ScanTotal), ScanTotal},
+        {"OpenScan", Scan(0), OpenScanTotal, true},
+        {"ExportedReadout", &Readout},
+        {"ExportedImageWrite", &ImageWrite},
+        OfModel("ModelAndItsEnd", [](PellandoEEPROM&) {}),
+        OfModel("ModelStore",
+                [](PellandoEEPROM& eeprom) {
+                    Properties set;
+                    set.SetProperty(10002, Property(std::int32_t{6}));
+                    set.SetProperty(10021, Property(std::int32_t{7}));  // in another piece than the checksum
+                    set.SetProperty(20001, Property(std::int32_t{1}));
+                    eeprom.Store(set);
+                }),
+        OfModel("ModelDump",
+                [](PellandoEEPROM& eeprom) {
+                    for (int i = 0; i < 20; ++i) {
+                        eeprom.SetProperty(10002, Property(std::int32_t{i}));
+                    }
+                    eeprom.Dump();
+                }),
+        OfModel("ModelBinary",
+                [](PellandoEEPROM& eeprom) {
+                    eeprom.StoreBinary(10100, Bytes(Map::BinarySize, 0x11));
+                    eeprom.StoreBinary(10203, {1, 2, 3, 4});
+                    eeprom.LoadBinary(10100);
+                },
+                {{Map::BinaryFirst, Map::BinaryFirstSize},
+                 {Map::BinarySecond, Map::BinarySecondSize},
+                 {Map::RawWords + 3 * Map::RawWordSize, Map::RawWordSize}}),
+        Checked("RamStore", Caught(&StoreParameters), {}),
+    };
 }
 
 /// Texts that a failure may have; the exports say nothing when the instrument could not be opened.
