@@ -80,6 +80,7 @@ TEST_P(ReceivedScan, BringsWhatWouldBeCollectedAndWhatCameBeforeAFailure) {
                   Status::TimedOut, Platform::Errors::IoIncomplete},
              Case{"bulk-in 1:stall", total, first, Status::EndpointHalted, Platform::Errors::GeneralFailure},
              Case{"bulk-in 1:short=512", total, first + 512, {}, {}},
+             Case{"bulk-in 1:short=300", 0, (IsNative() ? 2 * Record : first) + 300, {}, {}},
          }) {
         SCOPED_TRACE(std::string(row.faults) + " of " + std::to_string(row.total));
         SimulatedHost host(GetParam());
