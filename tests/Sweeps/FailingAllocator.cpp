@@ -28,7 +28,7 @@ void* Allocate(std::size_t size) {
 
 }  // namespace
 
-// The forms for arrays stand on these.
+// The forms for arrays stand on these, but for sanitizers, which have theirs.
 void* operator new(std::size_t size) {
     if (void* const memory = Allocate(size)) {
         return memory;
