@@ -1,29 +1,12 @@
 #include "EepromFile.h"
 
 #include <filesystem>
-#include <stdexcept>
 #include <utility>
 
-#include "Protocol/Instrument.h"
 #include "Utilities/Files/AtomicFile.h"
-#include "Utilities/Files/ByteSource.h"
 #include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Simulator {
-
-std::vector<std::uint8_t> ReadEepromFile(const std::string& fileName) {
-    const auto source = Utilities::Files::OpenByteSource(fileName);
-    std::vector<std::uint8_t> bytes = Utilities::Files::ReadUpTo(*source, Protocol::EepromSize);
-    if (bytes.size() != Protocol::EepromSize) {
-        std::error_code unknown;
-        const auto size = bytes.size() < Protocol::EepromSize ? bytes.size()
-                                                              : std::filesystem::file_size(fileName, unknown);
-        throw std::runtime_error(fileName + " has " + std::to_string(size) + " bytes, but an EEPROM has " +
-                                 std::to_string(Protocol::EepromSize) +
-                                 "; name another file, or remove this one to begin with a fresh EEPROM");
-    }
-    return bytes;
-}
 
 EepromFile::EepromFile(PollLoop& pollLoop, std::string name, Log logger)
     : loop_(pollLoop), fileName_(std::move(name)), log_(std::move(logger)) {}

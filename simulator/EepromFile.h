@@ -1,19 +1,13 @@
 #pragma once
 
-#include <cstdint>
 #include <memory>
 #include <string>
-#include <vector>
 
 #include "PollLoop.h"
 #include "SimulatedInstrument.h"
 #include "TransferLog.h"
 
 namespace Varnholt::Simulator {
-
-/// An EEPROM image from a file. Throws `std::runtime_error` with a text for people when it cannot be read or
-/// has not exactly 8192 bytes.
-std::vector<std::uint8_t> ReadEepromFile(const std::string& fileName);
 
 /// Keeps an instrument's EEPROM in a file: written a moment after the memory changed, and at the end. The
 /// file is replaced only when the new one is complete. Lives on the loop's thread.

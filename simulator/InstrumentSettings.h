@@ -1,6 +1,7 @@
 #pragma once
 
 #include <array>
+#include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <optional>
@@ -68,5 +69,8 @@ struct InstrumentSettings {
     /// Called after the EEPROM changed, on the thread that brought the change.
     std::function<void()> memoryChanged;
 };
+
+/// The first, second, ... of several instruments: serial, chip id and seed are its own. Counts from 0.
+InstrumentSettings SettingsOfNumber(std::size_t index);
 
 }  // namespace Varnholt::Simulator

@@ -17,6 +17,7 @@
 #include "Capture/PcapngWriter.h"
 #include "Capture/UsbCapture.h"
 #include "EepromFile.h"
+#include "EepromImageFile.h"
 #include "FaultPlan.h"
 #include "FreshEeprom.h"
 #include "KernelPort.h"
@@ -35,9 +36,7 @@ namespace Protocol = Varnholt::Protocol;
 namespace Usb = Varnholt::Platform::Usb;
 
 InstrumentSettings MakeSettings(const ProgramOptions& options, std::size_t index) {
-    InstrumentSettings settings;
-    settings.serial = "SIM" + std::to_string(10001 + index).substr(1);
-    settings.chipId.back() = static_cast<std::uint8_t>(settings.chipId.back() + index);
+    InstrumentSettings settings = SettingsOfNumber(index);
     settings.firmware = options.firmware == "old" ? OldFirmware : NewFirmware;
     settings.seed = options.seed + index;
     settings.light = options.light;

@@ -2,6 +2,7 @@
 #include <span>
 #include <string>
 
+#include "Interface/HostCall.h"
 #include "Interface/Operations.h"
 #include "ostra.h"
 #include "Utilities/Exceptions/Exceptions.h"
@@ -29,6 +30,7 @@ template <class Operation>
 std::int32_t Framed(std::int32_t codeOfRuntimeException, Operation operation) noexcept {
     lastError.clear();
     try {
+        const Varnholt::Interface::HostCall call;
         operation();
         return OSTRA_OK;
     } catch (const RuntimeException& exception) {

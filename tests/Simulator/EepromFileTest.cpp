@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "EepromFile.h"
+#include "EepromImageFile.h"
 #include "FreshEeprom.h"
 #include "PollLoop.h"
 #include "Protocol/Instrument.h"

@@ -1,0 +1,8 @@
+#include "Interface/HostCall.h"
+
+namespace Varnholt::Interface {
+
+HostCall::HostCall() = default;
+HostCall::~HostCall() = default;
+
+}  // namespace Varnholt::Interface
