@@ -24,6 +24,7 @@ class LoggedDeviceFiles final : public Platform::DeviceFileSystem {
     LoggedDeviceFiles(const LoggedDeviceFiles&) = delete;
     LoggedDeviceFiles& operator=(const LoggedDeviceFiles&) = delete;
 
+    bool LoadEnumeration() override { return below_.LoadEnumeration(); }
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
     Handle Open(const std::string& path) override;
     bool CloseFile(Handle file) override;

@@ -35,6 +35,8 @@ class DeviceFileSystem {
   public:
     virtual ~DeviceFileSystem() = default;
 
+    /// Loads what `ListInterfaces` needs of the system; false when it cannot be had, and every list is empty.
+    virtual bool LoadEnumeration() { return true; }
     /// The paths of the interfaces of `interfaceClass` that are present, in a stable order.
     virtual std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) = 0;
 

@@ -35,7 +35,7 @@ bool FilesAreReplaced() {
 }  // namespace
 
 bool DeviceInterfaces::Load() {
-    return !CallMustFail("LoadEnumeration") && (FilesAreReplaced() || LoadSystemInterfaces());
+    return !CallMustFail("LoadEnumeration") && DeviceFiles().LoadEnumeration();
 }
 
 DeviceList DeviceInterfaces::MakeList(const Protocol::Guid& interfaceClass, bool withRegistryFallback) {

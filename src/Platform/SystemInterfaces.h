@@ -5,7 +5,6 @@
 /// For `DeviceInterfaces`: the enumeration of the system itself, whatever took the place of its device files.
 namespace Varnholt::Platform {
 
-bool LoadSystemInterfaces();
 DeviceList MakeSystemList(const Protocol::Guid& interfaceClass, bool withRegistryFallback);
 
 }  // namespace Varnholt::Platform

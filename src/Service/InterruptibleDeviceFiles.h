@@ -36,6 +36,7 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
     void Resume();
     bool IsInterrupted() const { return interrupted_.load(); }
 
+    bool LoadEnumeration() override { return below_.LoadEnumeration(); }
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
     Handle Open(const std::string& path) override;
     bool CloseFile(Handle file) override;

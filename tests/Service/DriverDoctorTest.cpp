@@ -1,6 +1,5 @@
 // What the doctor says on Windows, where kernel drivers present the instruments.
 #include "ExpectFindings.h"
-#include "Platform/CallFilter.h"
 #include "Platform/HostQueries.h"
 #include "Protocol/UsbIoDriver.h"
 #include "Service/Win32/Diagnosis.h"
@@ -79,13 +78,11 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
         if (row.isSilent) {
             driver.Script(0, {.after = Never});
         }
-        Platform::InstallCallFilter(
-            [&](std::string_view call) { return call == "LoadEnumeration" ? row.enumeration : 0; });
+        driver.enumerationFailure = row.enumeration;
         Service::Observer nobody;
         Service::Interruption none;
         Service::Context context(nobody, none);
         ExpectFindings(Service::DiagnoseDrivers(context), row.levels, row.text, row.fix, row.failure);
-        Platform::InstallCallFilter({});
         Platform::Override64BitHost(std::nullopt);
     }
 }

@@ -137,6 +137,11 @@ std::size_t ScriptedDriver::MostControlsAtOnce() const {
     return mostControls_;
 }
 
+bool ScriptedDriver::LoadEnumeration() {
+    SetLastError(enumerationFailure);
+    return enumerationFailure == Errors::Success;
+}
+
 std::vector<std::string> ScriptedDriver::ListInterfaces(const Protocol::Guid& interfaceClass) {
     std::vector<std::string> listed;
     std::ranges::copy_if(paths_, std::back_inserter(listed), [&](const std::string& path) {

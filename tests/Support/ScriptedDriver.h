@@ -78,6 +78,10 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     /// The most controls that were ever running at once.
     std::size_t MostControlsAtOnce() const;
 
+    /// What keeps the enumeration from being loaded.
+    Platform::ErrorCode enumerationFailure = Platform::Errors::Success;
+
+    bool LoadEnumeration() override;
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
     Platform::Handle Open(const std::string& path) override;
     bool CloseFile(Platform::Handle file) override;

@@ -309,6 +309,50 @@ TEST_F(Shipped, ProgramsDoTheWholeJob) {
     EXPECT_EQ(Instrument(path).Eeprom(), std::vector<BYTE>(image.begin(), image.end()));
 }
 
+/// Tells Wine where the program of that name gets its setupapi from.
+void ChooseSetupApi(const std::string& program, const std::string& origin) {
+    HKEY key = nullptr;
+    RegCreateKeyA(HKEY_CURRENT_USER, ("Software\\Wine\\AppDefaults\\" + program + "\\DllOverrides").c_str(),
+                  &key);
+    RegSetValueExA(key, "setupapi", 0, REG_SZ, reinterpret_cast<const BYTE*>(origin.c_str()),
+                   static_cast<DWORD>(origin.size() + 1));
+    RegCloseKey(key);
+}
+
+TEST_F(Shipped, DoctorNamesTheReason) {
+    const bool is64Bit = StandInDriver::HostIs64Bit();
+    const auto expect = [](DWORD code, const std::string& text, const std::string& options = "",
+                           const std::string& program = Shipped::tool) {
+        const auto told = RunProgram(Quoted(program) + " doctor --json" + options);
+        EXPECT_EQ(told.first, code) << told.second;
+        EXPECT_THAT(told.second, HasSubstr(text));
+    };
+    expect(3, "no device with either driver is plugged in");
+    const std::string path = driver->PlugIn();
+    expect(0, "answers (firmware ");
+    expect(0, is64Bit ? "on 64-bit Windows the USBIO driver is used; devices present: 1"
+                      : "on 32-bit Windows the instrument's own driver is used; devices present: 1");
+    expect(3, "which is not used here: --transport asks for",
+           is64Bit ? " --transport native" : " --transport usbio");
+    if (is64Bit) {
+        Instrument(path).SetInterfaceVersion(0x0300);
+        expect(3, "has a USBIO driver of interface version 3.00");
+        Instrument(path).SetInterfaceVersion(0x0230);
+    }
+    const std::string copy = "C:\\doctor\\doctor.exe";
+    CreateDirectoryA("C:\\doctor", nullptr);
+    ASSERT_TRUE(CopyFileA(tool.c_str(), copy.c_str(), FALSE));
+    ChooseSetupApi("doctor.exe", "");
+    expect(3, "setupapi.dll, which finds instruments, cannot be loaded", "", copy);
+    // Any other library lacks the functions.
+    ASSERT_TRUE(CopyFileA(ShippedLibrary::path.c_str(), "C:\\doctor\\setupapi.dll", FALSE));
+    ChooseSetupApi("doctor.exe", "native");
+    expect(3, "setupapi.dll, which finds instruments, lacks functions", "", copy);
+    Instrument(path).UseElsewhere();
+    // The stand-in for the instrument's own driver has no refusal that Wine passes on: its pipes are gone.
+    expect(is64Bit ? 4 : 3, is64Bit ? "used by another process" : "not there any more");
+}
+
 TEST_F(Shipped, ToolShowsTheButtonAndTheRemoval) {
     const std::string path = driver->PlugIn();
     ChildProcess monitor(ChildProcess::Program{Quoted(tool) + " monitor --for 15", PrintedPath});

@@ -4,10 +4,6 @@
 
 namespace Varnholt::Platform {
 
-bool LoadSystemInterfaces() {
-    return true;
-}
-
 DeviceList MakeSystemList(const Protocol::Guid& interfaceClass, bool /*withRegistryFallback*/) {
     return MakePathList(interfaceClass, SystemDeviceFiles().ListInterfaces(interfaceClass));
 }

@@ -4,6 +4,7 @@
 
 #include "Platform/CallFilter.h"
 #include "Platform/SystemInterfaces.h"
+#include "Platform/Win32/SetupApi.h"
 #include "Platform/Win32/Windows.h"
 
 namespace Varnholt::Platform {
@@ -23,6 +24,8 @@ OVERLAPPED* SystemRecord(Overlapped& record) {
 
 class WindowsDeviceFiles final : public DeviceFileSystem {
   public:
+    bool LoadEnumeration() override { return SystemSetupApi().Load() != nullptr; }
+
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override {
         std::vector<std::string> paths;
         const DeviceList list = MakeSystemList(interfaceClass, true);

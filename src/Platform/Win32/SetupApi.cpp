@@ -1,6 +1,13 @@
 #include "Platform/Win32/SetupApi.h"
 
 namespace Varnholt::Platform {
+namespace {
+SetupApi systemSetupApi;
+}
+
+SetupApi& SystemSetupApi() {
+    return systemSetupApi;
+}
 
 SetupApi::~SetupApi() {
     Unload();

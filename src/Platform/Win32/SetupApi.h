@@ -35,4 +35,7 @@ class SetupApi final {
     EntryPoints entryPoints_{};  // written under lock, before a caller has its address
 };
 
+/// The process's own.
+SetupApi& SystemSetupApi();
+
 }  // namespace Varnholt::Platform

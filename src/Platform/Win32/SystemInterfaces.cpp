@@ -8,8 +8,6 @@
 namespace Varnholt::Platform {
 namespace {
 
-SetupApi setupApi;
-
 /// NT hosts before version 5 have no device-interface enumeration.
 bool HostKeepsInterfacesInRegistry() {
     constexpr std::uint32_t NtFamily = 2;
@@ -19,15 +17,11 @@ bool HostKeepsInterfacesInRegistry() {
 
 }  // namespace
 
-bool LoadSystemInterfaces() {
-    return setupApi.Load() != nullptr;
-}
-
 DeviceList MakeSystemList(const Protocol::Guid& interfaceClass, bool withRegistryFallback) {
     if (withRegistryFallback && HostKeepsInterfacesInRegistry()) {
         return MakePathList(interfaceClass, ListRegistryInterfaces(interfaceClass));
     }
-    return MakeSetupApiList(setupApi, interfaceClass);
+    return MakeSetupApiList(SystemSetupApi(), interfaceClass);
 }
 
 }  // namespace Varnholt::Platform
