@@ -6,6 +6,7 @@ namespace Varnholt::Tests {
 namespace {
 
 constexpr const char* ReadyEvent = "ostra-test-child-is-ready";
+constexpr DWORD LongestRun = 120'000;  // milliseconds; in an emulated machine a program is slow
 
 int HoldLock(const std::string& name, bool abandon) {
     const HANDLE lock = CreateMutexA(nullptr, FALSE, name.c_str());
@@ -50,7 +51,7 @@ ChildProcess::ChildProcess(Program program) : ready_(CreateEventA(nullptr, FALSE
 }
 
 ChildProcess::~ChildProcess() {
-    WaitForSingleObject(process_.hProcess, 20'000);
+    WaitForSingleObject(process_.hProcess, LongestRun);
     CloseHandle(process_.hThread);
     CloseHandle(process_.hProcess);
     CloseHandle(ready_);
@@ -62,7 +63,7 @@ bool ChildProcess::IsReady() {
 
 DWORD ChildProcess::Wait() {
     DWORD code = STILL_ACTIVE;
-    WaitForSingleObject(process_.hProcess, 20'000);
+    WaitForSingleObject(process_.hProcess, LongestRun);
     GetExitCodeProcess(process_.hProcess, &code);
     return code;
 }
