@@ -1,6 +1,7 @@
 #include <algorithm>
 #include <atomic>
 
+#include "Platform/CallFilter.h"
 #include "Protocol/Instrument.h"
 #include "Support/DriverTest.h"
 #include "UsbIo/CUsbIoReader.h"
@@ -132,6 +133,25 @@ TEST_F(CUsbIoThreadTest, ReadsAStreamInOrder) {
     EXPECT_TRUE(reader_.WaitForExit());
     EXPECT_THAT(reader_.Received(), ElementsAreArray(expected));
     ExpectEnd(3);
+}
+
+TEST_F(CUsbIoThreadTest, NeedsAnEventAndRoomToReadInto) {
+    Platform::InstallCallFilter([](std::string_view call) {
+        return call == "MakeAutoResetEvent" ? Platform::Errors::NoSystemResources : Platform::Errors::Success;
+    });
+    EXPECT_FALSE(reader_.StartThread());
+    Platform::InstallCallFilter({});
+    for (const std::uint32_t size : {0U, 1U}) {
+        Reader reader;
+        Bind(reader, BulkInEndpoint);
+        driver_.Script(BulkInEndpoint, {.data = {7}, .after = 1});
+        reader.readsWanted = 1;
+        ASSERT_TRUE(reader.AllocateBuffers(size, 1));
+        ASSERT_TRUE(reader.StartThread());
+        EXPECT_TRUE(reader.WaitForExit());
+        EXPECT_EQ(reader.Received().size(), size);
+        EXPECT_TRUE(reader.ShutdownThread());
+    }
 }
 
 TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
