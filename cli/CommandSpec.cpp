@@ -72,7 +72,8 @@ OptionSpec& OptionSpec::Between(double lowest, double highest) {
 }
 
 OptionSpec& OptionSpec::OneOf(const std::vector<std::string>& values) {
-    option_->check(CLI::IsMember(values).description(""));
+    // The name is for whoever wants to know the values.
+    option_->check(CLI::IsMember(values).description("").name("{" + CLI::detail::join(values, ",") + "}"));
     return *this;
 }
 

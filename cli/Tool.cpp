@@ -214,4 +214,15 @@ ExitCode RunTool(const std::vector<std::string>& arguments, Streams& streams,
     }
 }
 
+void ShowCommandLine(const std::function<void(CLI::App& tool)>& look) {
+    std::ostringstream unused;
+    Streams streams{unused, unused, unused, {}, {}};
+    Service::Interruption interruption;
+    Session session(streams, interruption);
+    CLI::App app(Description, "ostra");
+    InstrumentOptions instrument;
+    BuildCommandLine(app, instrument, session);
+    look(app);
+}
+
 }  // namespace Varnholt::Cli

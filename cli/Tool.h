@@ -1,10 +1,15 @@
 #pragma once
 
+#include <functional>
 #include <string>
 #include <vector>
 
 #include "ExitCode.h"
 #include "Session.h"
+
+namespace CLI {
+class App;
+}
 
 namespace Varnholt::Cli {
 
@@ -12,5 +17,8 @@ namespace Varnholt::Cli {
 /// thrown; every failure has been reported on `err`.
 ExitCode RunTool(const std::vector<std::string>& arguments, Streams& streams,
                  Service::Interruption& interruption);
+
+/// Lets `look` see the parser with all commands, as the help describes them; nothing is run.
+void ShowCommandLine(const std::function<void(CLI::App& tool)>& look);
 
 }  // namespace Varnholt::Cli

@@ -79,6 +79,7 @@ std::string RefuseNegative(const std::string& text) {
 }  // namespace
 
 void DefineOptions(CLI::App& program, ProgramOptions& options) {
+    program.description("Simulates the instrument, so that everything runs without hardware.");
     program.footer(Footer + FaultHelp());
     program.set_version_flag("--version", "ostra-simulator " OSTRA_VERSION, "print the version");
     program.add_option("--name", options.names, "the instrument's name; repeated: one instrument for each")
@@ -97,12 +98,14 @@ void DefineOptions(CLI::App& program, ProgramOptions& options) {
         .add_option("--firmware", options.firmware, "old: one measurement mode; new: three to choose from")
         ->check(CLI::IsMember({"old", "new"}))
         ->capture_default_str();
-    program.add_option("--seed", options.seed, "of the noise")->check(RefuseNegative)->capture_default_str();
+    program.add_option("--seed", options.seed, "seed of the noise")
+        ->check(RefuseNegative)
+        ->capture_default_str();
     program.add_option("--light", options.light, "brightness of the lamp; 0 is dark")
         ->check(CLI::Range(0.0, 1e6))
         ->check(RefuseNan)
         ->capture_default_str();
-    program.add_option("--gain", options.gain, "of the sensor's amplifier")
+    program.add_option("--gain", options.gain, "gain of the sensor's amplifier")
         ->check(CLI::Range(0.0, 1e6))
         ->check(RefuseNan)
         ->capture_default_str();

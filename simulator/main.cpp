@@ -190,7 +190,7 @@ int main(int argc, char** argv) {
     Varnholt::Platform::SecureStandardStreams();
     constexpr int usageError = 2;
     ProgramOptions options;
-    CLI::App program("Simulates the instrument, so that everything runs without hardware.");
+    CLI::App program;
     DefineOptions(program, options);
     try {
         program.parse(argc, argv);
