@@ -33,14 +33,14 @@ std::string TextOfPacket(const Bytes& block) {
     const auto age = std::chrono::system_clock::now().time_since_epoch() - std::chrono::microseconds(time);
     EXPECT_LT(std::chrono::abs(age), std::chrono::minutes(10));
     EXPECT_EQ(time, LoadLittle32(&block[44]) * std::uint64_t{1'000'000} + LoadLittle32(&block[52]));
-    EXPECT_EQ(TextOf(block, 48, 4) + TextOf(block, 32, 4) + TextOf(block, 8, 4),
-              "00 00 00 0000 00 00 0000 00 00 00");
+    EXPECT_EQ(TextOf(block, 48, 4) + TextOf(block, 8, 4), "00 00 00 0000 00 00 00");
+    const std::uint64_t id = std::uint64_t{LoadLittle32(&block[32])} << 32 | LoadLittle32(&block[28]);
     EXPECT_EQ(TextOf(block, 76, 16), Hex(Bytes(16).data(), 16)) << "of isochronous transfers only";
     const std::size_t size = LoadLittle32(&block[20]);
     EXPECT_EQ(size, LoadLittle32(&block[24]));
-    std::string text = number(28) + " " + static_cast<char>(block[36]) + " " + TextOf(block, 37, 2) + " " +
-                       std::to_string(block[39]) + "/" + std::to_string(LoadLittle16(&block[40])) + " " +
-                       TextOf(block, 42, 2) + " " +
+    std::string text = std::to_string(id) + " " + static_cast<char>(block[36]) + " " + TextOf(block, 37, 2) +
+                       " " + std::to_string(block[39]) + "/" + std::to_string(LoadLittle16(&block[40])) +
+                       " " + TextOf(block, 42, 2) + " " +
                        std::to_string(static_cast<std::int32_t>(LoadLittle32(&block[56]))) + " " +
                        number(60) + " " + number(64) + " [" + TextOf(block, 68, 8) + "] " +
                        TextOf(block, 92, size - 64);
@@ -113,6 +113,8 @@ TEST(CaptureTest, HoldsEveryTransferAsUsbmonDoes) {
         EXPECT_EQ(captured->Submit(refused), code);
         EXPECT_EQ(refused.completions, 0);
     }
+    const TestTransfer direct = TestTransfer::In(Protocol::BulkInEndpoint, 1);
+    writer.Write({0x500000007, false, 127, &direct, "words"});
     EXPECT_FALSE(writer.Failed());
     EXPECT_EQ(TextOfFile(path),
               "0A 0D 0D 0A 2C 00 00 00 4D 3C 2B 1A 01 00 00 00 FF FF FF FF FF FF FF FF "
@@ -138,7 +140,8 @@ TEST(CaptureTest, HoldsEveryTransferAsUsbmonDoes) {
               "9 S 03 82 2/1 2D 3C -115 1 0 [00 00 00 00 00 00 00 00] \n"
               "9 C 03 82 2/1 2D 3C -71 0 0 [00 00 00 00 00 00 00 00] \n"
               "10 S 03 82 2/1 2D 3C -115 1 0 [00 00 00 00 00 00 00 00] \n"
-              "10 C 03 82 2/1 2D 3C -108 0 0 [00 00 00 00 00 00 00 00] \n");
+              "10 C 03 82 2/1 2D 3C -108 0 0 [00 00 00 00 00 00 00 00] \n"
+              "21474836487 S 03 82 127/1 2D 3C -115 1 0 [00 00 00 00 00 00 00 00] ; words\n");
     EXPECT_TRUE(Capture::PcapngWriter(folder.Path("none/capture"), "test").Failed());
 }
 

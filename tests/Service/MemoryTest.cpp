@@ -139,7 +139,7 @@ TEST(ImageEditTest, RefusesWhatItCannotProve) {
                 Protocol::StoreBig32(&elsewhere[at + 2], address - start + target);
             }
         }
-        std::copy_n(image.begin() + start, 1064, elsewhere.begin() + target);
+        std::copy_n(image.data() + start, 1064, elsewhere.data() + target);
         return elsewhere;
     };
     const EepromImage calibration = moved(Map::Calibration, 8192, 6000);

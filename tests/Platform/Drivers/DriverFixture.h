@@ -10,7 +10,6 @@
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFileSystem.h"
 #include "Platform/WaitableObjects.h"
-#include "Protocol/ByteOrder.h"
 #include "Protocol/NativeDriver.h"
 #include "Protocol/UsbIoDriver.h"
 #include "Support/HookedUsb.h"
@@ -37,45 +36,52 @@ struct Request {
     bool TakeSignal() { return Platform::Wait(event.Get(), 0) == Platform::WaitResult::Signalled; }
 };
 
-inline Bytes NativeBlock(std::uint8_t request, std::uint8_t direction, std::uint16_t value = 0,
-                         std::uint16_t index = 0, std::uint8_t type = 2, std::uint8_t recipient = 0) {
-    Bytes block(Protocol::NativeDriver::ControlBlockSize, 0xEE);  // reserved and padding bytes do not matter
-    block[Protocol::NativeDriver::Block::Direction] = direction;
-    block[Protocol::NativeDriver::Block::Type] = type;
-    block[Protocol::NativeDriver::Block::Recipient] = recipient;
-    block[Protocol::NativeDriver::Block::Request] = request;
-    Protocol::StoreLittle16(&block[Protocol::NativeDriver::Block::Value], value);
-    Protocol::StoreLittle16(&block[Protocol::NativeDriver::Block::Index], index);
-    return block;
+inline std::uint8_t ByteOf(std::uint32_t value, unsigned number) {
+    return static_cast<std::uint8_t>(value >> 8 * number);
 }
 
-inline Bytes ConfigurationBlock(std::uint16_t configuration = 0, std::uint16_t entries = 1,
-                                std::uint16_t interface = 0, std::uint16_t alternate = 0,
-                                std::uint32_t maximumTransfer = 65536) {
-    namespace Block = Protocol::UsbIoDriver::ConfigurationBlock;
-    Bytes block(Block::Size);
-    Protocol::StoreLittle16(&block[Block::ConfigurationIndex], configuration);
-    Protocol::StoreLittle16(&block[Block::InterfaceCount], entries);
-    Protocol::StoreLittle16(&block[Block::FirstEntry + Block::EntryInterface], interface);
-    Protocol::StoreLittle16(&block[Block::FirstEntry + Block::EntryAlternateSetting], alternate);
-    Protocol::StoreLittle32(&block[Block::FirstEntry + Block::EntryMaximumTransferSize], maximumTransfer);
+/// The blocks of both drivers as hosts lay them out; reserved and padding bytes of the first do not matter.
+inline Bytes NativeBlock(std::uint8_t request, std::uint8_t direction, std::uint16_t value = 0,
+                         std::uint16_t index = 0, std::uint8_t type = 2, std::uint8_t recipient = 0) {
+    return {direction,        type,
+            recipient,        0xEE,
+            request,          0xEE,
+            ByteOf(value, 0), ByteOf(value, 1),
+            ByteOf(index, 0), ByteOf(index, 1)};
+}
+
+inline Bytes ConfigurationBlock(std::uint8_t configuration = 0, std::uint8_t entries = 1,
+                                std::uint8_t interface = 0, std::uint8_t alternate = 0,
+                                std::uint32_t most = 65536) {
+    Bytes block{configuration, 0, entries, 0, interface, 0, alternate, 0};
+    block.insert(block.end(), {ByteOf(most, 0), ByteOf(most, 1), ByteOf(most, 2), ByteOf(most, 3)});
+    block.resize(260);
     return block;
 }
 
 inline Bytes RequestBlock(std::uint8_t request, std::uint16_t value = 0, std::uint16_t index = 0,
-                          std::uint32_t type = 2, std::uint32_t recipient = 0, std::uint8_t reserved = 0) {
-    namespace Block = Protocol::UsbIoDriver::RequestBlock;
-    Bytes block(Block::Size);
-    Protocol::StoreLittle32(&block[Block::Type], type);
-    Protocol::StoreLittle32(&block[Block::Recipient], recipient);
-    block[Block::ReservedBits] = reserved;
-    block[Block::Request] = request;
-    Protocol::StoreLittle16(&block[Block::Value], value);
-    Protocol::StoreLittle16(&block[Block::Index], index);
-    return block;
+                          std::uint8_t type = 2, std::uint8_t recipient = 0, std::uint8_t reserved = 0) {
+    return {0,
+            0,
+            0,
+            0,
+            type,
+            0,
+            0,
+            0,
+            recipient,
+            0,
+            0,
+            0,
+            reserved,
+            request,
+            ByteOf(value, 0),
+            ByteOf(value, 1),
+            ByteOf(index, 0),
+            ByteOf(index, 1)};
 }
 
-/// Both drivers over one scripted device, "port1".
+/// Both drivers over one device, "port1".
 class DriverFixture : public testing::Test {
   protected:
     DriverFixture() { bus_.devices = {{"port1", device_}}; }
