@@ -53,11 +53,6 @@ OptionSpec& OptionSpec::Excludes(const char* name) {
     return *this;
 }
 
-OptionSpec& OptionSpec::Needs(const char* name) {
-    option_->needs(name);
-    return *this;
-}
-
 OptionSpec& OptionSpec::Between(double lowest, double highest) {
     return Check([lowest, highest](const std::string& text) -> std::string {
         double value = 0;

@@ -22,9 +22,8 @@ class OptionSpec final {
     /// The heading under which the help lists it.
     OptionSpec& Group(const char* heading);
     OptionSpec& Required();
-    /// Another option, by its name, that must not or must be there as well.
+    /// Another option, by its name, that must not be there as well.
     OptionSpec& Excludes(const char* name);
-    OptionSpec& Needs(const char* name);
     OptionSpec& Between(double lowest, double highest);
     OptionSpec& OneOf(const std::vector<std::string>& values);
     /// `check` answers what is wrong with a text; empty: nothing.
