@@ -12,16 +12,17 @@ Cause::Cause(const std::exception& snapshotOf)
     }
 }
 
-void Cause::Print(std::ostream& stream) const {
+std::string Cause::Text() const {
     if (isEmpty_) {
-        return;
+        return {};
     }
-    stream << "\ncaused by: " << Tools::ReadableName(*type_) << ": " << message_ << "\n";
+    std::string text = "\ncaused by: " + Tools::ReadableName(*type_) + ": " + message_ + "\n";
     for (const std::string& entry : trace_) {
         if (!entry.empty()) {
-            stream << "\t" << entry << "\n";
+            text += "\t" + entry + "\n";
         }
     }
+    return text;
 }
 
 }  // namespace Varnholt::Utilities::Exceptions

@@ -21,7 +21,9 @@ class Cause : public std::exception {
 
     /// Writes "\ncaused by: ", the type, ": ", the message and a newline, then each trace entry on a line of
     /// its own behind a tab.
-    void Print(std::ostream& stream) const;
+    void Print(std::ostream& stream) const { stream << Text(); }
+    /// The same as a text: a program that prints it in another way does without streams.
+    std::string Text() const;
 
   private:
     const std::type_info* type_ = nullptr;

@@ -2,7 +2,6 @@
 
 #include <concepts>
 #include <new>
-#include <sstream>
 #include <string>
 #include <type_traits>
 #include <typeinfo>
@@ -48,10 +47,8 @@ class ExceptionAdapter : public StdExceptionAdapter<X>, public TraceableExceptio
             return GetStdMessage();
         }
         try {
-            std::ostringstream stream;
-            Print(stream);
             whatText_ = GetStdMessage();
-            if (const std::string traceText = stream.str(); !traceText.empty()) {
+            if (const std::string traceText = TraceText(); !traceText.empty()) {
                 whatText_ += "\n" + traceText;
             }
             return whatText_.c_str();

@@ -13,17 +13,16 @@ bool IsVerboseText() {
     return verboseText;
 }
 
-void TraceableException::Print(std::ostream& stream) const {
+std::string TraceableException::TraceText() const {
+    std::string text;
     bool first = true;
     for (const std::string& entry : trace_) {
         if (!entry.empty()) {
-            stream << (first ? "\t" : "\n\t") << entry;
+            text += (first ? "\t" : "\n\t") + entry;
         }
         first = false;
     }
-    if (!cause_.IsEmpty()) {
-        cause_.Print(stream);
-    }
+    return text + cause_.Text();
 }
 
 }  // namespace Varnholt::Utilities::Exceptions

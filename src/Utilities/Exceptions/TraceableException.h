@@ -28,7 +28,9 @@ class TraceableException {
 
     /// Writes the trace, each entry behind a tab, entries separated by newlines; empty entries write nothing.
     /// The cause follows where there is one.
-    void Print(std::ostream& stream) const;
+    void Print(std::ostream& stream) const { stream << TraceText(); }
+    /// The same as a text.
+    std::string TraceText() const;
 
   protected:
     explicit TraceableException(const std::string& location, const Cause& recorded = {})

@@ -5,14 +5,12 @@
 #include "DeviceDriver/Generic/Utilities/EndianConversion.h"
 #include "Utilities/Exceptions/Exceptions.h"
 #include "Utilities/Exceptions/Trace.h"
-#include "Utilities/Tools/LexicalCast.h"
 
 namespace Varnholt::DeviceDriver::Generic::Configuration {
 
 namespace EndianConversion = Utilities::EndianConversion;
 using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Exceptions::ResourceException;
-using Varnholt::Utilities::Tools::lexical_cast;
 
 namespace {
 
@@ -39,7 +37,7 @@ bool Properties::Contains(std::uint16_t id) const {
 const Property& Properties::GetProperty(std::uint16_t id) const try {
     const auto entry = Find(datastore_, id);
     if (entry == datastore_.end()) {
-        throw ResourceException("id " + lexical_cast<std::string>(id) + " doesn't exist", Here());
+        throw ResourceException("id " + std::to_string(id) + " doesn't exist", Here());
     }
     return entry->second;
 }
@@ -48,7 +46,7 @@ TRACED
 Property& Properties::GetProperty(std::uint16_t id) try {
     const auto entry = Find(datastore_, id);
     if (entry == datastore_.end()) {
-        throw ResourceException("id " + lexical_cast<std::string>(id) + " doesn't exist", Here());
+        throw ResourceException("id " + std::to_string(id) + " doesn't exist", Here());
     }
     return entry->second;
 }
@@ -99,7 +97,7 @@ void Properties::Dump(std::vector<std::uint8_t>::iterator first, std::vector<std
 TRACED
 
 std::string Properties::GetExceptionText(std::uint16_t id) try {
-    return "Requested data is not available (ID " + lexical_cast<std::string>(id) + ")";
+    return "Requested data is not available (ID " + std::to_string(id) + ")";
 }
 TRACED
 

@@ -5,14 +5,12 @@
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Utilities/Exceptions/Trace.h"
-#include "Utilities/Tools/LexicalCast.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 using namespace Generic::Configuration;
 using Generic::Utilities::DataException;
 using Varnholt::Utilities::Exceptions::Here;
-using Varnholt::Utilities::Tools::lexical_cast;
 
 namespace {
 
@@ -158,7 +156,7 @@ Property ConfigurationDataConverter::GetDefaultProperty(std::uint16_t id) try {
                 break;
         }
     }
-    throw DataException("invalid property id " + lexical_cast<std::string>(id), Here());
+    throw DataException("invalid property id " + std::to_string(id), Here());
 }
 TRACED
 

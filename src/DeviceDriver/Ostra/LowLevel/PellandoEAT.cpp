@@ -13,7 +13,6 @@
 #include "DeviceDriver/Ostra/LowLevel/PellandoLog.h"
 #include "Protocol/EepromMap.h"
 #include "Utilities/Exceptions/Trace.h"
-#include "Utilities/Tools/LexicalCast.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
@@ -25,7 +24,6 @@ using Generic::Utilities::DataException;
 using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Exceptions::ResourceException;
 using Varnholt::Utilities::Exceptions::SourceLocation;
-using Varnholt::Utilities::Tools::lexical_cast;
 
 namespace {
 
@@ -127,7 +125,7 @@ std::int32_t PellandoEAT::SizeOf(std::uint16_t id) const try {
     const auto& entries = datastore_.GetDatastore();
     const auto entry = Find(entries, id);
     if (entry == entries.end() || std::next(entry) == entries.end()) {
-        throw ResourceException("id " + lexical_cast<std::string>(id) + " doesn't exist", Here());
+        throw ResourceException("id " + std::to_string(id) + " doesn't exist", Here());
     }
     return To32Bits(std::int64_t{std::next(entry)->second.AsLong()} - entry->second.AsLong());
 }

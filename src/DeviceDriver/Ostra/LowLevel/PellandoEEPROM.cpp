@@ -10,7 +10,6 @@
 #include "Protocol/EepromMap.h"
 #include "Protocol/PropertyIdentifiers.h"
 #include "Utilities/Exceptions/Trace.h"
-#include "Utilities/Tools/LexicalCast.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
@@ -20,7 +19,6 @@ using namespace Generic::Configuration;
 using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Exceptions::ResourceException;
 using Varnholt::Utilities::Exceptions::RuntimeException;
-using Varnholt::Utilities::Tools::lexical_cast;
 using Varnholt::Utilities::Tools::SmartPointer;
 using Bytes = std::vector<std::uint8_t>;
 
@@ -183,7 +181,7 @@ const Property& PellandoEEPROM::GetProperty(std::uint16_t id) try {
     if (ConfigurationDataConverter::IsCalibrationParameter(id)) {
         return calibration_.GetProperty(id);
     }
-    throw ResourceException("unknown property id = " + lexical_cast<std::string>(id), Here());
+    throw ResourceException("unknown property id = " + std::to_string(id), Here());
 }
 TRACED
 

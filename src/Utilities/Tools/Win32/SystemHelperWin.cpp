@@ -1,7 +1,6 @@
 #include "Utilities/Tools/Win32/SystemHelperWin.h"
 
 #include "Utilities/Exceptions/Trace.h"
-#include "Utilities/Tools/LexicalCast.h"
 
 namespace Varnholt::Utilities::Tools {
 namespace {
@@ -75,13 +74,13 @@ TRACED
 
 std::string GetServicePack() try {
     const Platform::VersionRecord record = Platform::ReadVersionRecord();
-    return record.servicePack + " (Build " + lexical_cast<std::string>(record.build & 0xFFFF) + ")";
+    return record.servicePack + " (Build " + std::to_string(record.build & 0xFFFF) + ")";
 }
 TRACED
 
 std::string GetOSVersion() {
     const Platform::VersionRecord record = Platform::ReadVersionRecord();
-    return lexical_cast<std::string>(record.major) + "." + lexical_cast<std::string>(record.minor);
+    return std::to_string(record.major) + "." + std::to_string(record.minor);
 }
 
 std::string GetOSDescription() {

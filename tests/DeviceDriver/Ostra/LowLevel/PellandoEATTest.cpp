@@ -62,7 +62,9 @@ class FreshTable : public testing::Test {
 
 TEST_F(FreshTable, IsTheOneOfAFreshInstrumentByteForByte) {
     Bytes image(Protocol::EepromSize, 0xFF);
-    const auto at = [&image](std::ptrdiff_t address) { return image.begin() + address; };
+    const auto at = [&image](std::uint32_t address) {
+        return image.begin() + static_cast<std::ptrdiff_t>(address);
+    };
     for (const std::uint32_t copy : {EepromMap::MainLog, EepromMap::LogCopy}) {
         PellandoEAT::GetDefaultLogData().Dump(at(copy), image.end(), true, true);
     }
