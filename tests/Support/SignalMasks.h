@@ -23,8 +23,10 @@ inline std::map<std::string, std::uint64_t> MasksOfOtherThreads() {
         std::string word;
         while (status >> word && word != "SigBlk:") {
         }
-        if (task.path().filename() != std::to_string(gettid())) {
-            status >> std::hex >> masks[task.path().filename()];
+        std::uint64_t mask = 0;
+        // A thread that ends meanwhile has no status any more.
+        if (task.path().filename() != std::to_string(gettid()) && status >> std::hex >> mask) {
+            masks[task.path().filename()] = mask;
         }
     }
     return masks;
