@@ -124,7 +124,8 @@ bool LoggedDeviceFiles::StartRead(Handle file, void* buffer, std::uint32_t lengt
     return StartTransfer(
         file, record,
         [isInterrupt, length](std::uint32_t transferred) {
-            return fmt::format("{} {} of {}", isInterrupt ? "interrupt" : "bulk in", transferred, length);
+            return Capture::DescribeData(
+                isInterrupt ? Protocol::InterruptInEndpoint : Protocol::BulkInEndpoint, transferred, length);
         },
         [&] { return below_.StartRead(file, buffer, length, record); });
 }
@@ -133,7 +134,9 @@ bool LoggedDeviceFiles::StartWrite(Handle file, const void* buffer, std::uint32_
                                    Overlapped& record) {
     return StartTransfer(
         file, record,
-        [length](std::uint32_t transferred) { return fmt::format("bulk out {} of {}", transferred, length); },
+        [length](std::uint32_t transferred) {
+            return Capture::DescribeData(Protocol::BulkOutEndpoint, transferred, length);
+        },
         [&] { return below_.StartWrite(file, buffer, length, record); });
 }
 

@@ -58,12 +58,4 @@ std::uint32_t AnswerStream::Take(std::uint8_t* buffer, std::uint32_t length) {
     return count;
 }
 
-std::vector<std::uint8_t> AnswerStream::Expected(std::uint64_t start, std::size_t length) const {
-    AnswerStream other = *this;
-    other.position_ = std::min(start, total_);
-    std::vector<std::uint8_t> bytes(length);
-    bytes.resize(length == 0 ? 0 : other.Take(bytes.data(), static_cast<std::uint32_t>(length)));
-    return bytes;
-}
-
 }  // namespace Varnholt::Simulator

@@ -26,9 +26,6 @@ class AnswerStream final {
     /// Moves at most `length` bytes, not 0, on to `buffer`, as one transfer.
     std::uint32_t Take(std::uint8_t* buffer, std::uint32_t length);
 
-    /// What the running measurement sends from `start` on; for tests.
-    std::vector<std::uint8_t> Expected(std::uint64_t start, std::size_t length) const;
-
   private:
     /// A measurement repeats after this many records: making them anew would cost more than the transfers
     /// that are measured against it. A prime, so that no two transfers of equal size are alike.

@@ -8,6 +8,7 @@
 namespace Varnholt::Simulator {
 namespace {
 
+namespace DataStage = Protocol::DataStage;
 using Protocol::LoadBig16;
 using Protocol::LoadBig32;
 using Protocol::Request;
@@ -60,20 +61,9 @@ bool Commands::Out(const Platform::Usb::SetupPacket& setup, std::span<const std:
             ++measurements;
             return true;
         case Request::SetMeasureParameters:
-            if (data.size() < 7) {
-                return false;
-            }
-            parameters = {LoadBig16(&data[0]), LoadBig16(&data[2]), LoadBig16(&data[4]), data[6]};
-            return true;
+            return SetParameters(data);
         case Request::SetMeasureMode:
-            if (data.empty()) {
-                return false;
-            }
-            // A mode that it does not have changes nothing.
-            if (HasModes() && data[0] >= 1 && data[0] <= settings_.modes.size()) {
-                mode = data[0];
-            }
-            return true;
+            return SetMode(data);
         case Request::WriteEeprom:
             return StartWrite(eeprom, data);
         case Request::DownloadEepromFirmware:
@@ -81,27 +71,11 @@ bool Commands::Out(const Platform::Usb::SetupPacket& setup, std::span<const std:
         case Request::ReadEeprom:
             return StartRead(data);
         case Request::WriteCpld:
-            if (data.size() < 6) {
-                return false;
-            }
-            cpld = {LoadBig16(&data[0]), LoadBig16(&data[2]), LoadBig16(&data[4])};
-            return true;
+            return WriteCpld(data);
         case Request::DownloadRamFirmware:
-            if (setup.value + data.size() > ramFirmware.size()) {
-                return false;
-            }
-            std::ranges::copy(data, ramFirmware.begin() + setup.value);
-            return true;
+            return DownloadToRam(setup.value, data);
         case Request::Reset:
-            if (data.empty()) {
-                return false;
-            }
-            // Ends what is under way; what was set stays until power is lost.
-            answers_.Stop();
-            write_.Stop();
-            lastResetCode = data[0];
-            ++resets;
-            return true;
+            return Reset(data);
         case Request::ButtonReport:
             ++buttonReports;
             return true;
@@ -110,69 +84,120 @@ bool Commands::Out(const Platform::Usb::SetupPacket& setup, std::span<const std:
     }
 }
 
+bool Commands::SetParameters(std::span<const std::uint8_t> data) {
+    if (data.size() <= DataStage::P4) {
+        return false;
+    }
+    parameters = {LoadBig16(&data[DataStage::P1]), LoadBig16(&data[DataStage::P2]),
+                  LoadBig16(&data[DataStage::P3]), data[DataStage::P4]};
+    return true;
+}
+
+bool Commands::SetMode(std::span<const std::uint8_t> data) {
+    if (data.size() < DataStage::SetModeSize) {
+        return false;
+    }
+    // A mode that it does not have changes nothing.
+    if (HasModes() && data[0] >= 1 && data[0] <= settings_.modes.size()) {
+        mode = data[0];
+    }
+    return true;
+}
+
+bool Commands::WriteCpld(std::span<const std::uint8_t> data) {
+    if (data.size() < DataStage::WriteCpldSize) {
+        return false;
+    }
+    cpld = {LoadBig16(&data[DataStage::C1]), LoadBig16(&data[DataStage::C2]),
+            LoadBig16(&data[DataStage::C3])};
+    return true;
+}
+
+bool Commands::DownloadToRam(std::uint16_t address, std::span<const std::uint8_t> data) {
+    if (address + data.size() > ramFirmware.size()) {
+        return false;
+    }
+    std::ranges::copy(data, ramFirmware.begin() + address);
+    return true;
+}
+
+/// Ends what is under way; what was set stays until power is lost.
+bool Commands::Reset(std::span<const std::uint8_t> data) {
+    if (data.size() < DataStage::ResetSize) {
+        return false;
+    }
+    answers_.Stop();
+    write_.Stop();
+    lastResetCode = data[0];
+    ++resets;
+    return true;
+}
+
+std::optional<Commands::Area> Commands::AreaOf(std::span<const std::uint8_t> data, std::size_t memorySize) {
+    if (data.size() < DataStage::Length + sizeof(std::uint16_t)) {
+        return std::nullopt;
+    }
+    const Area area{LoadBig32(&data[DataStage::Address]), LoadBig16(&data[DataStage::Length])};
+    const bool isInside = area.address <= memorySize && area.length <= memorySize - area.address;
+    return isInside ? std::optional(area) : std::nullopt;
+}
+
 bool Commands::StartWrite(std::vector<std::uint8_t>& memory, std::span<const std::uint8_t> data) {
     write_.Stop();
-    if (data.size() < 6) {
-        return false;
+    const auto area = AreaOf(data, memory.size());
+    if (area) {
+        write_.Start(memory, area->address, area->length);
     }
-    const std::uint32_t address = LoadBig32(&data[0]);
-    const std::uint32_t length = LoadBig16(&data[4]);
-    if (address > memory.size() || length > memory.size() - address) {
-        return false;
-    }
-    write_.Start(memory, address, length);
-    return true;
+    return area.has_value();
 }
 
 bool Commands::StartRead(std::span<const std::uint8_t> data) {
     answers_.Stop();
-    if (data.size() < 6) {
-        return false;
+    const auto area = AreaOf(data, eeprom.size());
+    if (area) {
+        const auto first = eeprom.begin() + static_cast<std::ptrdiff_t>(area->address);
+        answers_.StartMemory({first, first + static_cast<std::ptrdiff_t>(area->length)});
     }
-    const std::uint32_t address = LoadBig32(&data[0]);
-    const std::uint32_t length = LoadBig16(&data[4]);
-    if (address > eeprom.size() || length > eeprom.size() - address) {
-        return false;
-    }
-    const auto first = eeprom.begin() + static_cast<std::ptrdiff_t>(address);
-    answers_.StartMemory({first, first + static_cast<std::ptrdiff_t>(length)});
-    return true;
+    return area.has_value();
+}
+
+std::size_t Commands::AnswerMode(std::span<std::uint8_t, LongestAnswer> answer) const {
+    const MeasureMode& current = CurrentMode();
+    const auto count = static_cast<std::uint8_t>(HasModes() ? settings_.modes.size() : 1);
+    answer[0] = settings_.announcedModes ? settings_.announcedModes : count;
+    answer[1] = mode;
+    answer[2] = 0;
+    answer[3] = current.coarseFactor;
+    answer[4] = current.tickMicroseconds;
+    answer[5] = current.flags;
+    return DataStage::MeasureModeSize;
 }
 
 std::optional<std::size_t> Commands::In(const Platform::Usb::SetupPacket& setup,
                                         std::span<std::uint8_t, LongestAnswer> answer) {
     switch (static_cast<Request>(setup.request)) {
         case Request::GetMeasureParameters:
-            StoreBig16(&answer[0], parameters.p1);
-            StoreBig16(&answer[2], parameters.p2);
-            StoreBig16(&answer[4], parameters.p3);
-            answer[6] = parameters.p4;
-            answer[7] = settings_.fifthParameter;
-            return 8;
-        case Request::GetMeasureMode: {
-            const MeasureMode& current = CurrentMode();
-            const auto count = static_cast<std::uint8_t>(HasModes() ? settings_.modes.size() : 1);
-            answer[0] = settings_.announcedModes ? settings_.announcedModes : count;
-            answer[1] = mode;
-            answer[2] = 0;
-            answer[3] = current.coarseFactor;
-            answer[4] = current.tickMicroseconds;
-            answer[5] = current.flags;
-            return 6;
-        }
+            StoreBig16(&answer[DataStage::P1], parameters.p1);
+            StoreBig16(&answer[DataStage::P2], parameters.p2);
+            StoreBig16(&answer[DataStage::P3], parameters.p3);
+            answer[DataStage::P4] = parameters.p4;
+            answer[DataStage::P5] = settings_.fifthParameter;
+            return DataStage::MeasureParametersSize;
+        case Request::GetMeasureMode:
+            return AnswerMode(answer);
         case Request::ReadCpld:
-            StoreBig16(&answer[0], cpld[0]);
-            return 2;
+            StoreBig16(answer.data(), cpld[0]);
+            return DataStage::ReadCpldSize;
         case Request::GetMisc:
-            StoreBig16(&answer[0], settings_.firmware);
-            StoreBig16(&answer[2], settings_.misc.m4);
-            StoreBig16(&answer[4], settings_.misc.m5);
-            answer[6] = settings_.misc.m1;
-            answer[7] = settings_.misc.m3;
-            return 8;
+            StoreBig16(&answer[DataStage::M2], settings_.firmware);
+            StoreBig16(&answer[DataStage::M4], settings_.misc.m4);
+            StoreBig16(&answer[DataStage::M5], settings_.misc.m5);
+            answer[DataStage::M1] = settings_.misc.m1;
+            answer[DataStage::M3] = settings_.misc.m3;
+            return DataStage::MiscSize;
         case Request::GetChipId:
             std::ranges::copy(settings_.chipId, answer.begin());
-            return 8;
+            return DataStage::ChipIdSize;
         default:
             return std::nullopt;
     }

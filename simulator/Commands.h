@@ -10,6 +10,7 @@
 #include "InstrumentSettings.h"
 #include "MemoryWrite.h"
 #include "Platform/Usb/UsbDevice.h"
+#include "Protocol/Instrument.h"
 
 namespace Varnholt::Simulator {
 
@@ -32,7 +33,7 @@ class Commands final {
 
     /// A vendor request from the host with its data stage; false: refused.
     bool Out(const Platform::Usb::SetupPacket& setup, std::span<const std::uint8_t> data);
-    static constexpr std::size_t LongestAnswer = 8;
+    static constexpr std::size_t LongestAnswer = Protocol::DataStage::MeasureParametersSize;
     /// A vendor request for an answer: its bytes, or nothing when refused.
     std::optional<std::size_t> In(const Platform::Usb::SetupPacket& setup,
                                   std::span<std::uint8_t, LongestAnswer> answer);
@@ -61,6 +62,18 @@ class Commands final {
   private:
     bool HasModes() const;
     const MeasureMode& CurrentMode() const;
+    bool SetParameters(std::span<const std::uint8_t> data);
+    bool SetMode(std::span<const std::uint8_t> data);
+    bool WriteCpld(std::span<const std::uint8_t> data);
+    bool DownloadToRam(std::uint16_t address, std::span<const std::uint8_t> data);
+    bool Reset(std::span<const std::uint8_t> data);
+    std::size_t AnswerMode(std::span<std::uint8_t, LongestAnswer> answer) const;
+    /// What a request names of a memory of so many bytes; nothing where it is not all inside.
+    struct Area {
+        std::uint32_t address;
+        std::uint32_t length;
+    };
+    static std::optional<Area> AreaOf(std::span<const std::uint8_t> data, std::size_t memorySize);
     bool StartWrite(std::vector<std::uint8_t>& memory, std::span<const std::uint8_t> data);
     bool StartRead(std::span<const std::uint8_t> data);
 

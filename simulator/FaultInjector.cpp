@@ -25,8 +25,7 @@ namespace {
 constexpr std::uint32_t InterruptInterval = 1;
 
 bool IsStandardRequest(const Transfer& transfer) {
-    constexpr std::uint8_t typeMask = 0x60;
-    return transfer.endpoint == 0 && (transfer.setup.requestType & typeMask) == 0;
+    return transfer.endpoint == 0 && transfer.setup.IsStandard();
 }
 
 /// The endpoint that a standard request frees of its halt; 0 for every other transfer.
@@ -138,7 +137,7 @@ ErrorCode FaultInjector::Begin(const TransferPointer& transfer) {
         HoldFor(transfer, transfer->fault->argument.value_or(0));
         return Errors::Success;
     }
-    if (ScopeOfEndpoint(transfer->endpoint) == FaultScope::Interrupt && !transfer->wasHeld) {
+    if (transfer->endpoint == Protocol::InterruptInEndpoint && !transfer->wasHeld) {
         HoldFor(transfer, InterruptInterval);
         return Errors::Success;
     }

@@ -4,12 +4,14 @@
 #include <charconv>
 #include <stdexcept>
 
-#include "Protocol/Instrument.h"
+#include "Protocol/EndpointNames.h"
 
 namespace Varnholt::Simulator {
 namespace {
 
 using Argument = FaultName::Argument;
+using Protocol::EndpointName;
+using Protocol::EndpointNames;
 
 constexpr std::array Names{
     FaultName{FaultKind::Stall, "stall", Argument::None, ""},
@@ -27,17 +29,6 @@ constexpr std::array Names{
     FaultName{FaultKind::GoneBefore, "gone-before", Argument::None, ""},
     FaultName{FaultKind::GoneDuring, "gone-during", Argument::None, ""},
     FaultName{FaultKind::GoneAfter, "gone-after", Argument::None, ""},
-};
-
-struct ScopeName {
-    FaultScope scope;
-    std::string_view name;
-};
-constexpr std::array Scopes{
-    ScopeName{FaultScope::Control, "control"},
-    ScopeName{FaultScope::BulkIn, "bulk-in"},
-    ScopeName{FaultScope::BulkOut, "bulk-out"},
-    ScopeName{FaultScope::Interrupt, "interrupt"},
 };
 
 [[noreturn]] void Refuse(std::string_view fault, const std::string& reason) {
@@ -69,12 +60,12 @@ std::string Joined(const Names& names) {
 /// "bulk-in 7+" in front of the colon.
 void ParsePlace(std::string_view text, std::string_view place, Fault& fault) {
     if (const auto blank = place.find_last_of(" \t"); blank != place.npos) {
-        const std::string_view scopeName = Trimmed(place.substr(0, blank));
-        const auto scope = std::ranges::find(Scopes, scopeName, &ScopeName::name);
-        if (scope == Scopes.end()) {
-            Refuse(text, "unknown transfers \"" + std::string(scopeName) + "\"; known: " + Joined(Scopes));
+        const std::string_view name = Trimmed(place.substr(0, blank));
+        const auto* const known = std::ranges::find(EndpointNames, name, &EndpointName::name);
+        if (known == EndpointNames.end()) {
+            Refuse(text, "unknown transfers \"" + std::string(name) + "\"; known: " + Joined(EndpointNames));
         }
-        fault.scope = scope->scope;
+        fault.endpoint = known->endpoint;
         place = place.substr(blank + 1);
     }
     if (place.ends_with('+')) {
@@ -124,25 +115,10 @@ Fault ParseFault(std::string_view text) {
     return fault;
 }
 
-std::size_t Place(FaultScope scope) {
-    return static_cast<std::size_t>(scope);
-}
-
 }  // namespace
 
 std::span<const FaultName> AllFaults() {
     return Names;
-}
-
-FaultScope ScopeOfEndpoint(std::uint8_t endpoint) {
-    switch (endpoint) {
-        case 0:
-            return FaultScope::Control;
-        case Protocol::InterruptInEndpoint:
-            return FaultScope::Interrupt;
-        default:
-            return (endpoint & 0x80) != 0 ? FaultScope::BulkIn : FaultScope::BulkOut;
-    }
 }
 
 FaultPlan FaultPlan::Parse(std::string_view text) {
@@ -157,49 +133,26 @@ FaultPlan FaultPlan::Parse(std::string_view text) {
     return FaultPlan(std::move(faults));
 }
 
-std::string ToText(const Fault& fault) {
-    std::string text;
-    if (const auto scope = std::ranges::find(Scopes, fault.scope, &ScopeName::scope); scope != Scopes.end()) {
-        text = std::string(scope->name) + " ";
-    }
-    text += std::to_string(fault.index) + (fault.fromThenOn ? "+:" : ":");
-    text += std::ranges::find(Names, fault.kind, &FaultName::kind)->name;
-    return fault.argument ? text + "=" + std::to_string(*fault.argument) : text;
-}
-
-std::string FaultPlan::Text() const {
-    std::string text;
-    for (const Fault& fault : faults_) {
-        text += (text.empty() ? "" : "; ") + ToText(fault);
-    }
-    return text;
-}
-
 bool FaultPlan::Uses(FaultKind kind) const {
     return std::ranges::find(faults_, kind, &Fault::kind) != faults_.end();
 }
 
 std::optional<Fault> FaultScript::Next(std::uint8_t endpoint) {
     const std::lock_guard lock(mutex_);
-    const FaultScope own = ScopeOfEndpoint(endpoint);
-    const std::uint32_t inAll = counts_[Place(FaultScope::All)]++;
-    const std::uint32_t inOwn = counts_[Place(own)]++;
+    const std::size_t place = Protocol::PlaceOfEndpoint(endpoint);
+    const std::uint32_t inAll = all_++;
+    const std::uint32_t inOwn = counts_[place]++;
     for (const Fault& fault : plan_.Faults()) {
-        if (fault.scope != FaultScope::All && fault.scope != own) {
+        if (fault.endpoint && fault.endpoint != EndpointNames[place].endpoint) {
             continue;
         }
-        const std::uint32_t index = fault.scope == FaultScope::All ? inAll : inOwn;
+        const std::uint32_t index = fault.endpoint ? inOwn : inAll;
         if (index == fault.index || (fault.fromThenOn && index > fault.index)) {
             ++hits_;
             return fault;
         }
     }
     return std::nullopt;
-}
-
-std::uint32_t FaultScript::Transfers() const {
-    const std::lock_guard lock(mutex_);
-    return counts_[Place(FaultScope::All)];
 }
 
 std::uint32_t FaultScript::Hits() const {

@@ -9,6 +9,8 @@
 #include <string_view>
 #include <vector>
 
+#include "Protocol/EndpointNames.h"
+
 namespace Varnholt::Simulator {
 
 /// What goes wrong with one transfer. "Not passed on" means that the device never sees it.
@@ -30,14 +32,10 @@ enum class FaultKind {
     GoneAfter,   ///< unplugged once the transfer is complete
 };
 
-/// Which transfers are counted for a fault's index.
-enum class FaultScope { All, Control, BulkIn, BulkOut, Interrupt };
-FaultScope ScopeOfEndpoint(std::uint8_t endpoint);
-
 struct Fault {
-    FaultScope scope = FaultScope::All;
-    std::uint32_t index = 0;  ///< of the transfer in its scope, in order of submission, from 0
-    bool fromThenOn = false;  ///< and every later transfer of the scope
+    std::optional<std::uint8_t> endpoint;  ///< whose transfers are counted; nothing: all
+    std::uint32_t index = 0;               ///< of the transfer among them, in order of submission, from 0
+    bool fromThenOn = false;               ///< and every later one of them
     FaultKind kind = FaultKind::Stall;
     std::optional<std::uint32_t> argument;
 
@@ -59,8 +57,6 @@ class FaultPlan final {
     /// Throws `std::invalid_argument` with a text that says what is wrong and what could stand there.
     static FaultPlan Parse(std::string_view text);
 
-    /// What `Parse` reads.
-    std::string Text() const;
     const std::vector<Fault>& Faults() const { return faults_; }
     bool Uses(FaultKind kind) const;
 
@@ -78,7 +74,6 @@ struct FaultName {
 };
 /// Every fault there is.
 std::span<const FaultName> AllFaults();
-std::string ToText(const Fault& fault);
 
 /// A plan being carried out: counts the transfers, over as many openings of the instrument as share it. Any
 /// thread.
@@ -90,13 +85,13 @@ class FaultScript final {
     std::optional<Fault> Next(std::uint8_t endpoint);
     const FaultPlan& Plan() const { return plan_; }
 
-    std::uint32_t Transfers() const;  ///< counted so far
-    std::uint32_t Hits() const;       ///< of them, those with a fault
+    std::uint32_t Hits() const;  ///< transfers so far that a fault was for
 
   private:
     const FaultPlan plan_;
-    mutable std::mutex mutex_;               // guards what follows
-    std::array<std::uint32_t, 5> counts_{};  // by scope
+    mutable std::mutex mutex_;  // guards what follows
+    std::uint32_t all_ = 0;
+    std::array<std::uint32_t, Protocol::EndpointNames.size()> counts_{};
     std::uint32_t hits_ = 0;
 };
 

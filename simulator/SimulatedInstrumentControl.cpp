@@ -14,8 +14,6 @@ using Platform::Usb::TransferStatus;
 
 namespace {
 
-constexpr std::uint8_t TypeMask = 0x60;
-constexpr std::uint8_t StandardType = 0x00;
 constexpr std::uint8_t RecipientMask = 0x1F;
 constexpr std::uint8_t ToDevice = 0;
 constexpr std::uint8_t ToInterface = 1;
@@ -39,7 +37,7 @@ enum StandardRequest : std::uint8_t {
 void SimulatedInstrument::Control(Transfer& transfer, std::uint64_t now, Completions& done) {
     const SetupPacket& setup = transfer.setup;
     const std::uint32_t length = std::min<std::uint32_t>(transfer.length, setup.length);
-    const bool standard = (setup.requestType & TypeMask) == StandardType;
+    const bool standard = setup.IsStandard();
     const std::uint8_t vendorType = setup.IsIn() ? Protocol::VendorIn : Protocol::VendorOut;
 
     if (!setup.IsIn()) {

@@ -4,7 +4,6 @@
 
 #include "Capture/DescribeRequest.h"
 #include "Capture/InterceptingDevice.h"
-#include "Protocol/Instrument.h"
 #include "TransferRecorder.h"
 
 namespace Varnholt::Simulator {
@@ -16,15 +15,10 @@ using Platform::Usb::UsbDevice;
 namespace {
 
 std::string Describe(const Transfer& transfer) {
-    constexpr std::uint8_t typeMask = 0x60;
-    constexpr std::uint8_t vendorType = 0x40;
     if (transfer.endpoint != 0) {
-        const std::string name = transfer.endpoint == Protocol::InterruptInEndpoint ? "interrupt"
-                                 : transfer.IsIn()                                  ? "bulk in"
-                                                                                    : "bulk out";
-        return name + " " + std::to_string(transfer.actualLength) + " of " + std::to_string(transfer.length);
+        return Capture::DescribeData(transfer.endpoint, transfer.actualLength, transfer.length);
     }
-    if ((transfer.setup.requestType & typeMask) == vendorType) {
+    if (transfer.setup.IsVendor()) {
         return Capture::DescribeRequest(
             transfer.setup.request, transfer.setup.value,
             {transfer.data, transfer.IsIn() ? transfer.actualLength : transfer.length});

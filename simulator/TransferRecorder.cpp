@@ -6,7 +6,7 @@
 
 #include "Capture/DescribeRequest.h"
 #include "Capture/InterceptingDevice.h"
-#include "Protocol/Instrument.h"
+#include "Protocol/EndpointNames.h"
 
 namespace Varnholt::Simulator {
 
@@ -19,19 +19,11 @@ using Platform::Usb::UsbDevice;
 namespace {
 
 std::string EndpointText(const RecordedTransfer& transfer) {
-    switch (transfer.endpoint) {
-        case 0:
-            return "control " + Hexadecimal(transfer.setup.request, 2) +
-                   (transfer.setup.IsIn() ? " in " : " out ");
-        case Protocol::BulkInEndpoint:
-            return "bulk-in ";
-        case Protocol::BulkOutEndpoint:
-            return "bulk-out ";
-        case Protocol::InterruptInEndpoint:
-            return "interrupt ";
-        default:
-            return "endpoint " + Hexadecimal(transfer.endpoint, 2) + " ";
+    std::string text(Protocol::EndpointNames[Protocol::PlaceOfEndpoint(transfer.endpoint)].name);
+    if (transfer.endpoint == 0) {
+        text += " " + Hexadecimal(transfer.setup.request, 2) + (transfer.setup.IsIn() ? " in" : " out");
     }
+    return text + " ";
 }
 
 }  // namespace

@@ -47,16 +47,6 @@ bool IsFile(int descriptor) {
 OutputDescriptor::OutputDescriptor(int openDescriptor, Ownership ownership)
     : descriptor_(openDescriptor), isOwn_(ownership == Ownership::Own), isFile_(IsFile(openDescriptor)) {}
 
-OutputDescriptor::OutputDescriptor(OutputDescriptor&& other) noexcept
-    : descriptor_(std::exchange(other.descriptor_, -1)),
-      isOwn_(other.isOwn_),
-      isFile_(other.isFile_),
-      patienceEnd_(other.patienceEnd_) {}
-
-OutputDescriptor::~OutputDescriptor() {
-    Close();
-}
-
 OutputDescriptor OutputDescriptor::StandardOutput() {
     const int twin = NonBlockingTwin(STDOUT_FILENO);
     return twin < 0 ? OutputDescriptor(STDOUT_FILENO, Ownership::Borrowed)

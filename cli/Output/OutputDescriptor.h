@@ -6,6 +6,7 @@
 #include <span>
 #include <string>
 #include <system_error>
+#include <utility>
 
 #include "Service/Interruption.h"
 
@@ -25,9 +26,13 @@ class OutputDescriptor final {
     static OutputDescriptor Open(const std::string& path, const Service::Interruption& interruption,
                                  std::error_code& error);
 
-    OutputDescriptor(OutputDescriptor&& other) noexcept;
+    OutputDescriptor(OutputDescriptor&& other) noexcept
+        : descriptor_(std::exchange(other.descriptor_, -1)),
+          isOwn_(other.isOwn_),
+          isFile_(other.isFile_),
+          patienceEnd_(other.patienceEnd_) {}
     OutputDescriptor& operator=(OutputDescriptor&&) = delete;
-    ~OutputDescriptor();
+    ~OutputDescriptor() { Close(); }
 
     struct Outcome {
         std::size_t accepted = 0;  ///< bytes, from the front

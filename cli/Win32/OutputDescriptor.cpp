@@ -31,16 +31,6 @@ OutputDescriptor::OutputDescriptor(int openDescriptor, Ownership ownership)
       isOwn_(ownership == Ownership::Own),
       isFile_(openDescriptor >= 0 && IsFile(openDescriptor)) {}
 
-OutputDescriptor::OutputDescriptor(OutputDescriptor&& other) noexcept
-    : descriptor_(std::exchange(other.descriptor_, -1)),
-      isOwn_(other.isOwn_),
-      isFile_(other.isFile_),
-      patienceEnd_(other.patienceEnd_) {}
-
-OutputDescriptor::~OutputDescriptor() {
-    Close();
-}
-
 OutputDescriptor OutputDescriptor::StandardOutput() {
     return {::_fileno(stdout), Ownership::Borrowed};
 }
@@ -67,11 +57,9 @@ OutputDescriptor::Outcome OutputDescriptor::Write(std::span<const char> bytes,
                                                   const Service::Interruption& interruption) {
     std::size_t accepted = 0;
     while (accepted < bytes.size()) {
-        if (!isFile_ && accepted > 0) {
-            // Nothing here tells whether a pipe has room; only what comes next is refused.
-            if (interruption.IsRequested()) {
-                return {accepted, std::make_error_code(std::errc::operation_canceled)};
-            }
+        // Nothing here tells whether a pipe has room; only what comes next is refused.
+        if (!isFile_ && accepted > 0 && interruption.IsRequested()) {
+            return {accepted, std::make_error_code(std::errc::operation_canceled)};
         }
         const std::size_t piece = std::min(bytes.size() - accepted, isFile_ ? FilePiece : PipePiece);
         const int taken = ::_write(descriptor_, bytes.data() + accepted, static_cast<unsigned>(piece));

@@ -3,13 +3,14 @@
 #include <array>
 #include <string_view>
 
-#include "Protocol/ByteOrder.h"
-#include "Protocol/Instrument.h"
+#include "Protocol/EndpointNames.h"
 
 namespace Varnholt::Capture {
 
 using namespace Protocol;
 namespace {
+
+using namespace DataStage;
 
 /// One number of a request's data stage, most significant byte first.
 struct Field {
@@ -29,20 +30,21 @@ constexpr std::array Descriptions{
     Description{Request::Measure, "Measure", {}},
     Description{Request::SetMeasureParameters,
                 "SetMeasureParameters",
-                {{{"p1", 0, 2}, {"p2", 2, 2}, {"p3", 4, 2}, {"p4", 6, 1}}}},
+                {{{"p1", P1, 2}, {"p2", P2, 2}, {"p3", P3, 2}, {"p4", P4, 1}}}},
     Description{Request::GetMeasureParameters,
                 "GetMeasureParameters",
-                {{{"p1", 0, 2}, {"p2", 2, 2}, {"p3", 4, 2}, {"p4", 6, 1}, {"p5", 7, 1}}}},
-    Description{Request::WriteEeprom, "WriteEEPROM", {{{"address", 0, 4}, {"length", 4, 2}}}},
-    Description{Request::ReadEeprom, "ReadEEPROM", {{{"address", 0, 4}, {"length", 4, 2}}}},
-    Description{Request::WriteCpld, "WriteCPLD", {{{"c1", 0, 2}, {"c2", 2, 2}, {"c3", 4, 2}}}},
+                {{{"p1", P1, 2}, {"p2", P2, 2}, {"p3", P3, 2}, {"p4", P4, 1}, {"p5", P5, 1}}}},
+    Description{Request::WriteEeprom, "WriteEEPROM", {{{"address", Address, 4}, {"length", Length, 2}}}},
+    Description{Request::ReadEeprom, "ReadEEPROM", {{{"address", Address, 4}, {"length", Length, 2}}}},
+    Description{Request::WriteCpld, "WriteCPLD", {{{"c1", C1, 2}, {"c2", C2, 2}, {"c3", C3, 2}}}},
     Description{Request::ReadCpld, "ReadCPLD", {{{"value", 0, 2}}}},
     Description{Request::GetMisc,
                 "GetMISC",
-                {{{"m1", 6, 1}, {"m2", 0, 2}, {"m3", 7, 1}, {"m4", 2, 2}, {"m5", 4, 2}}}},
+                {{{"m1", M1, 1}, {"m2", M2, 2}, {"m3", M3, 1}, {"m4", M4, 2}, {"m5", M5, 2}}}},
     Description{Request::Reset, "Reset", {{{"code", 0, 1}}}},
-    Description{
-        Request::DownloadEepromFirmware, "DownloadEEPROMFirmware", {{{"address", 0, 4}, {"length", 4, 2}}}},
+    Description{Request::DownloadEepromFirmware,
+                "DownloadEEPROMFirmware",
+                {{{"address", Address, 4}, {"length", Length, 2}}}},
     Description{Request::SetMeasureMode, "SetMeasureMode", {{{"mode", 0, 1}}}},
     Description{Request::ButtonReport, "ButtonReport", {}},
     Description{Request::GetMeasureMode,
@@ -86,6 +88,11 @@ std::string DescribeRequest(std::uint8_t request, std::uint16_t value, std::span
         return text;
     }
     return "vendor request 0x" + Hexadecimal(request, 2);
+}
+
+std::string DescribeData(std::uint8_t endpoint, std::uint32_t moved, std::uint32_t asked) {
+    return std::string(EndpointNames[PlaceOfEndpoint(endpoint)].words) + " " + std::to_string(moved) +
+           " of " + std::to_string(asked);
 }
 
 }  // namespace Varnholt::Capture

@@ -11,6 +11,9 @@ namespace Varnholt::Capture {
 /// the instrument does not have reads "vendor request 0x99".
 std::string DescribeRequest(std::uint8_t request, std::uint16_t value, std::span<const std::uint8_t> data);
 
+/// Data that have moved over another endpoint: "bulk in 256 of 256".
+std::string DescribeData(std::uint8_t endpoint, std::uint32_t moved, std::uint32_t asked);
+
 /// So many upper-case digits, without a prefix.
 std::string Hexadecimal(std::uint32_t value, int digits);
 

@@ -9,8 +9,7 @@ namespace Varnholt::Capture {
 namespace {
 
 std::string Comment(const Usb::Transfer& transfer, bool completion) {
-    constexpr std::uint8_t vendorType = 0x40;
-    if (transfer.endpoint != 0 || (transfer.setup.requestType & 0x60) != vendorType) {
+    if (transfer.endpoint != 0 || !transfer.setup.IsVendor()) {
         return {};
     }
     const bool dataKnown = completion || !transfer.IsIn();

@@ -8,6 +8,7 @@
 
 #include "Platform/CompletionSource.h"
 #include "Platform/Handle.h"
+#include "Platform/InPlace.h"
 
 namespace Varnholt::Platform {
 
@@ -68,11 +69,7 @@ class EmbeddedEvent final {
 
   private:
     struct Impl;
-    Impl& Own();
-
-    /// Holds the platform's `Impl`.
-    static constexpr std::size_t ImplSize = 80;
-    alignas(void*) std::byte storage_[ImplSize];
+    InPlace<Impl, 80> impl_;
 };
 
 /// A process-local recursive lock; no handle, no time-out. It takes no memory: neither making nor locking
@@ -90,11 +87,7 @@ class RecursiveMutex final {
 
   private:
     struct Impl;
-    Impl& Own();
-
-    /// Holds the platform's `Impl`.
-    static constexpr std::size_t ImplSize = 80;
-    alignas(void*) std::byte storage_[ImplSize];
+    InPlace<Impl, 80> impl_;
 };
 
 }  // namespace Varnholt::Platform

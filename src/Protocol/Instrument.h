@@ -25,6 +25,15 @@ enum class Request : std::uint8_t {
     GetChipId = 0xD2,               ///< in 8
 };
 
+/// What lies where in the data stages, and the stages' sizes.
+namespace DataStage {
+enum : std::uint32_t { P1 = 0, P2 = 2, P3 = 4, P4 = 6, P5 = 7, MeasureParametersSize = 8 };
+enum : std::uint32_t { Address = 0, Length = 4, MemoryRequestSize = 8 };
+enum : std::uint32_t { C1 = 0, C2 = 2, C3 = 4, WriteCpldSize = 6, ReadCpldSize = 2 };
+enum : std::uint32_t { M2 = 0, M4 = 2, M5 = 4, M1 = 6, M3 = 7, MiscSize = 8 };
+enum : std::uint32_t { MeasureModeSize = 6, ChipIdSize = 8, ResetSize = 1, SetModeSize = 1 };
+}  // namespace DataStage
+
 inline constexpr std::uint8_t VendorOut = 0x40;
 inline constexpr std::uint8_t VendorIn = 0xC0;
 

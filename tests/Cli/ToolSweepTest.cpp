@@ -7,6 +7,7 @@
 #include "Protocol/PropertyIdentifiers.h"
 #include "Service/Memory/ImageEdit.h"
 #include "Service/Memory/ImageModel.h"
+#include "Support/FaultText.h"
 #include "ToolFixture.h"
 
 namespace Varnholt::Tests {
@@ -16,11 +17,11 @@ using Cli::ExitCode;
 using Simulator::Fault;
 using Simulator::FaultKind;
 using Simulator::FaultPlan;
-using Simulator::FaultScope;
 using Bytes = std::vector<std::uint8_t>;
 using Files = std::map<std::string, Bytes>;
 
 constexpr std::uint32_t RecordSize = 5000;
+constexpr std::uint8_t ControlEndpoint = 0;
 
 /// What the data of a command are protected by.
 enum class Data {
@@ -128,20 +129,20 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
     bool IsLeftOut(const Fault& fault) const {
         const bool isWrongData = fault.kind == FaultKind::Flip || fault.kind == FaultKind::Garbage ||
                                  fault.kind == FaultKind::Stale;
-        const bool isEnd = fault.scope == FaultScope::BulkIn &&
+        const bool isEnd = fault.endpoint == Protocol::BulkInEndpoint &&
                            (fault.kind == FaultKind::Short || fault.kind == FaultKind::Empty);
         // What is sent to an instrument it takes as a whole, so that a driver need not say how much went.
-        const bool isUntold = transport_ == Transport::Native && fault.scope == FaultScope::Control &&
+        const bool isUntold = transport_ == Transport::Native && fault.endpoint == ControlEndpoint &&
                               fault.kind == FaultKind::Empty;
         const bool isTrusted = command_.data != Data::Checked &&
                                (isWrongData || (isEnd && command_.data == Data::TrustedOpen) || isUntold);
         // A transfer that reaches a pipe late lets the one behind it take its data: no real one does.
-        const bool isOvertaken = command_.recording != nullptr && fault.scope == FaultScope::BulkIn &&
-                                 fault.kind == FaultKind::Late;
+        const bool isOvertaken = command_.recording != nullptr &&
+                                 fault.endpoint == Protocol::BulkInEndpoint && fault.kind == FaultKind::Late;
         // Whatever the interrupt pipe brings is a press of the button.
         const bool isEvent =
-            command_.showsEvents &&
-            (Unplugs(fault) || (fault.scope == FaultScope::Interrupt && fault.kind == FaultKind::Empty));
+            command_.showsEvents && (Unplugs(fault) || (fault.endpoint == Protocol::InterruptInEndpoint &&
+                                                        fault.kind == FaultKind::Empty));
         return isTrusted || isOvertaken || isEvent;
     }
 
@@ -151,7 +152,7 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
     }
 
     static std::vector<ExitCode> CodesOf(const Fault& fault) {
-        if (fault.scope == FaultScope::Control && !Unplugs(fault)) {
+        if (fault.endpoint == ControlEndpoint && !Unplugs(fault)) {
             // What an instrument has not understood it does not answer.
             return {ExitCode::InputOutput, ExitCode::Timeout};
         }
@@ -198,7 +199,7 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
     }
 
     void Check(const Fault& fault, const Result& result, const Result& undisturbed) const {
-        SCOPED_TRACE(Simulator::ToText(fault) + "\n" + result.err);
+        SCOPED_TRACE(FaultText(fault) + "\n" + result.err);
         if (result.code == undisturbed.code) {
             EXPECT_EQ(result.out, undisturbed.out);
             EXPECT_EQ(result.files, undisturbed.files);
@@ -217,13 +218,12 @@ TEST_P(ToolSweep, SucceedsWholeOrFailsWithNothingLost) {
     ASSERT_TRUE(undisturbed.code == ExitCode::Success || undisturbed.code == ExitCode::Different)
         << undisturbed.err;
     int cases = 0, leftOut = 0, ran = 0;
-    for (const FaultScope scope :
-         {FaultScope::Control, FaultScope::BulkIn, FaultScope::BulkOut, FaultScope::Interrupt}) {
+    for (const auto& [endpoint, endpointName, words] : Protocol::EndpointNames) {
         bool isHit = true;
         for (std::uint32_t index = 0; isHit && !HasFailure(); ++index) {
             isHit = false;
             for (const auto& name : Simulator::AllFaults()) {
-                Fault fault{scope, index, false, name.kind, {}};
+                Fault fault{endpoint, index, false, name.kind, {}};
                 if (name.kind == FaultKind::Late) {
                     fault.argument = 20;
                 }

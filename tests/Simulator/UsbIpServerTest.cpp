@@ -16,6 +16,7 @@
 #include "Platform/Usb/UsbIpDevice.h"
 #include "Simulator/ServerThread.h"
 #include "Support/Bytes.h"
+#include "Support/MeasuredBytes.h"
 #include "Support/ResourceCount.h"
 #include "Support/TestTransfer.h"
 #include "UsbIpServer.h"
@@ -137,7 +138,7 @@ TEST_F(UsbIpServerTest, DataTravelBothWaysWhole) {
         const Bytes data = Do(*device, TestTransfer::In(BulkInEndpoint, piece));
         all.insert(all.end(), data.begin(), data.end());
     }
-    const auto expected = [&](Commands& state) { return state.Answers().Expected(0, settings.scanBytes); };
+    const auto expected = [&](Commands& state) { return Tests::MeasuredBytes(state, settings.scanBytes); };
     server_.Do([&] { EXPECT_EQ(instrument->WithCommands(expected), all); });
 }
 

@@ -26,6 +26,7 @@
 #include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
 #include "Protocol/Instrument.h"
+#include "Support/FaultText.h"
 #include "Support/SimulatedHost.h"
 #include "Support/TestClock.h"
 #include "TransferRecorder.h"
@@ -71,16 +72,15 @@ constexpr std::uint64_t OpenScanTotal = 155'000;
 /// for.
 constexpr std::uint64_t TimeLimit = 40'000;  // ms
 
-/// Ends with what was thrown, or with why the log was lost.
-std::function<Outcome()> Caught(std::function<void(Outcome& lost)> work) {
+/// Ends with what was thrown.
+std::function<Outcome()> Caught(std::function<void()> work) {
     return [work = std::move(work)]() -> Outcome {
-        Outcome lost;
         try {
-            work(lost);
+            work();
         } catch (const Utilities::Exceptions::TraceableException& exception) {
             return std::string(exception.what());
         }
-        return lost;
+        return std::nullopt;
     };
 }
 
@@ -103,7 +103,7 @@ Outcome ImageWrite() {
 
 /// `total` bytes; 0: until the instrument stops.
 std::function<Outcome()> Scan(std::uint32_t total) {
-    return Caught([total](Outcome&) {
+    return Caught([total] {
         PellandoFunctionality instrument(nullptr, 0);
         instrument.StartScan(ScanRecord, 1, total);
         Bytes record(ScanRecord);
@@ -175,7 +175,7 @@ void CheckEeprom(const Bytes& before, const std::vector<Area>& written, const By
     }
 }
 
-void StoreParameters(Outcome&) {
+void StoreParameters() {
     PellandoRAM ram(Commands(new PellandoFunctionality(nullptr, 0)));
     Properties set("PhysicalConditions");
     ram.Load(set);
@@ -193,14 +193,17 @@ Operation Checked(const char* name, std::function<Outcome()> run, std::vector<Ar
     return operation;
 }
 
+/// Called when all that is left is the end of a model, which writes the log and tells nobody what fails.
+std::function<void()> beforeModelsEnd = [] {};
+
 Operation OfModel(const char* name, std::function<void(PellandoEEPROM&)> work,
                   const std::vector<Area>& written = {}) {
     std::vector<Area> all = written;
     all.insert(all.end(), {{Map::MainLog, Map::LogSize}, {Map::LogCopy, Map::LogSize}});
-    const auto onModel = [work = std::move(work)](Outcome& lost) {
+    const auto onModel = [work = std::move(work)] {
         PellandoEEPROM eeprom(Commands(new PellandoFunctionality(nullptr, 0)));
-        eeprom.ReportLostLog([&lost](const std::string& reason) { lost = reason; });
         work(eeprom);
+        beforeModelsEnd();
     };
     return Checked(name, Caught(onModel), std::move(all));
 }
@@ -297,24 +300,27 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
         return settings;
     }
 
-    std::vector<RecordedTransfer> Undisturbed() const {
+    std::size_t toldTransfers_ = SIZE_MAX;  ///< the first ones, of which a failure does not stay untold
+
+    std::vector<RecordedTransfer> Undisturbed() {
         const TestClock clock(TestTime::Virtual, 1);
         SimulatedHost host(transport_);
         host.Add("one", Settings());
         Simulator::TransferRecorder recorder;
         host.Bus().WrapDevices([&](const std::string&, auto device) { return recorder.Record(device); });
+        beforeModelsEnd = [&] { toldTransfers_ = recorder.Count(); };
         EXPECT_EQ(operation_.run(), std::nullopt);
+        beforeModelsEnd = [] {};
         return recorder.Transfers();
     }
 
-    void RunWith(const FaultPlan& plan, const RecordedTransfer& undisturbed) const {
-        SCOPED_TRACE(plan.Text());
-        const Fault& fault = plan.Faults().front();
+    void RunWith(const Fault& fault, const RecordedTransfer& undisturbed, bool isTold) const {
+        SCOPED_TRACE(FaultText(fault));
         const TestClock clock(TestTime::Virtual, fault.index + 1);
         const Stopwatch stopwatch(clock);
         SimulatedHost host(transport_);
         auto& instrument = host.Add("one", Settings());
-        const auto script = std::make_shared<Simulator::FaultScript>(plan);
+        const auto script = std::make_shared<Simulator::FaultScript>(FaultPlan({fault}));
         host.Bus().WrapDevices([&](const std::string&, auto device) {
             return Simulator::InjectFaults(device, script, Platform::ClockScheduler(),
                                            [&] { instrument.Unplug(); });
@@ -326,7 +332,7 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
         stopwatch.ExpectAtMost(TimeLimit);
         if (outcome) {
             EXPECT_TRUE(IsDocumented(transport_, *outcome)) << *outcome;
-        } else if (script->Hits() > 0 && script->Transfers() > fault.index) {
+        } else if (script->Hits() > 0 && isTold) {
             EXPECT_TRUE(MayGoUnnoticed(transport_, fault, undisturbed, operation_.endsWithShortTransfer))
                 << "passed all the same";
         }
@@ -370,7 +376,7 @@ bool NeverEnds(const Operation& operation, const Fault& fault) {
 /// first, the place among all differs from run to run.
 Fault CountedByEndpoint(Fault fault, const std::vector<RecordedTransfer>& undisturbed) {
     const std::uint8_t endpoint = undisturbed[fault.index].endpoint;
-    fault.scope = Simulator::ScopeOfEndpoint(endpoint);
+    fault.endpoint = endpoint;
     const std::span before(undisturbed.data(), fault.index);
     fault.index =
         static_cast<std::uint32_t>(std::ranges::count(before, endpoint, &RecordedTransfer::endpoint));
@@ -415,8 +421,8 @@ TEST_P(FaultSweep, EveryFaultAtEveryTransfer) {
     while (cases < faults.size() && !HasFailure() &&
            !(inRealTime && Platform::ClockScheduler().Now() - begin > RealTimeBudget)) {
         const Fault& fault = faults[cases * step % faults.size()];
-        RunWith(FaultPlan({inRealTime ? CountedByEndpoint(fault, undisturbed) : fault}),
-                undisturbed[fault.index]);
+        RunWith(inRealTime ? CountedByEndpoint(fault, undisturbed) : fault, undisturbed[fault.index],
+                fault.index < toldTransfers_);
         ++cases;
     }
     std::printf("%zu transfers, %zu of %zu cases\n", undisturbed.size(), cases, faults.size());

@@ -1,9 +1,7 @@
 #include <atomic>
 #include <cstdio>
 #include <cstdlib>
-#include <memory>
 #include <mutex>
-#include <new>
 
 #include "Platform/Linux/Dispatcher.h"
 #include "Platform/WaitableObjects.h"
@@ -82,21 +80,11 @@ void RecursiveMutex::Impl::UnlockCooperatively(Clock& clock) {
     clock.Preempt(hold);
 }
 
-RecursiveMutex::RecursiveMutex() {
-    static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
-    std::construct_at(reinterpret_cast<Impl*>(storage_));
-}
-
-RecursiveMutex::~RecursiveMutex() {
-    std::destroy_at(&Own());
-}
-
-RecursiveMutex::Impl& RecursiveMutex::Own() {
-    return *std::launder(reinterpret_cast<Impl*>(storage_));
-}
+RecursiveMutex::RecursiveMutex() = default;
+RecursiveMutex::~RecursiveMutex() = default;
 
 void RecursiveMutex::lock() {
-    Impl& impl = Own();
+    Impl& impl = *impl_;
     ThreadRecord& me = CurrentThread();
     if (impl.owner.load(std::memory_order_relaxed) != &me) {
         Clock& clock = CurrentClock();
@@ -112,7 +100,7 @@ void RecursiveMutex::lock() {
 }
 
 void RecursiveMutex::unlock() {
-    Impl& impl = Own();
+    Impl& impl = *impl_;
     if (--impl.depth > 0) {
         return;
     }

@@ -171,33 +171,23 @@ struct EmbeddedEvent::Impl {
     EventObject object;
 };
 
-EmbeddedEvent::EmbeddedEvent() {
-    static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
-    std::construct_at(reinterpret_cast<Impl*>(storage_));
-}
-
-EmbeddedEvent::~EmbeddedEvent() {
-    std::destroy_at(&Own());
-}
-
-EmbeddedEvent::Impl& EmbeddedEvent::Own() {
-    return *std::launder(reinterpret_cast<Impl*>(storage_));
-}
+EmbeddedEvent::EmbeddedEvent() = default;
+EmbeddedEvent::~EmbeddedEvent() = default;
 
 void EmbeddedEvent::Reset(const std::shared_ptr<CompletionSource>& source) {
     const DispatcherLock hold;
-    Own().object.Reset(source);
+    impl_->object.Reset(source);
 }
 
 void EmbeddedEvent::Signal() {
     DispatcherLock hold;
-    Own().object.Signal(CurrentThread());
+    impl_->object.Signal(CurrentThread());
     CurrentClock().Preempt(hold);
 }
 
 bool EmbeddedEvent::Wait(std::uint32_t timeout) {
     // Its owner keeps it alive, so the reference counts nothing.
-    std::array entries{WaitEntry{ObjectRef(ObjectRef(), &Own().object)}};
+    std::array entries{WaitEntry{ObjectRef(ObjectRef(), &impl_->object)}};
     return WaitForObjects(entries, timeout).result == WaitResult::Signalled;
 }
 

@@ -12,6 +12,7 @@
 #include <thread>
 #include <vector>
 
+#include "Platform/Linux/ErrnoCodes.h"
 #include "Platform/Linux/HostSignalsBlocked.h"
 #include "Platform/Usb/LibUsbErrors.h"
 #include "Platform/Usb/LibUsbEvents.h"
@@ -248,17 +249,9 @@ void LibUsbDevice::Complete(Submission& submission) {
 std::shared_ptr<UsbDevice> OpenLibUsbDevice(const std::string& deviceNode, ErrorCode& error) {
     const int file = open(deviceNode.c_str(), O_RDWR | O_CLOEXEC);
     if (file < 0) {
-        switch (errno) {
-            case EACCES:
-            case EPERM:
-                error = Errors::AccessDenied;
-                break;
-            case ENOENT:
-            case ENODEV:
-                error = Errors::FileNotFound;
-                break;
-            default:
-                error = Errors::GeneralFailure;
+        error = Linux::CodeOf(errno);
+        if (error == Errors::DeviceNotConnected) {
+            error = Errors::FileNotFound;  // what was never open cannot be lost
         }
         return nullptr;
     }

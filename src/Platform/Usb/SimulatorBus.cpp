@@ -10,6 +10,7 @@
 #include <sstream>
 #include <utility>
 
+#include "Platform/Linux/ErrnoCodes.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/UsbIpDevice.h"
 
@@ -76,7 +77,8 @@ std::optional<Connection> Connect(const std::string& name) {
 int ConnectToUsable(const std::string& name, ErrorCode& error) {
     const auto connection = Connect(name);
     if (!connection) {
-        error = errno == EACCES || errno == EPERM ? Errors::AccessDenied : Errors::DeviceNotConnected;
+        error =
+            Linux::CodeOf(errno) == Errors::AccessDenied ? Errors::AccessDenied : Errors::DeviceNotConnected;
         return -1;
     }
     if (!connection->usable) {

@@ -34,6 +34,8 @@ struct SetupPacket {
     std::uint16_t length = 0;
 
     bool IsIn() const { return (requestType & 0x80) != 0; }
+    bool IsStandard() const { return (requestType & 0x60) == 0; }
+    bool IsVendor() const { return (requestType & 0x60) == 0x40; }
     bool operator==(const SetupPacket&) const = default;
 };
 

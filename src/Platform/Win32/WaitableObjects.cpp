@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <memory>
-#include <new>
 
 #include "Platform/CallFilter.h"
 #include "Platform/Win32/Windows.h"
@@ -101,32 +100,22 @@ WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) 
 }
 
 struct EmbeddedEvent::Impl {
-    HANDLE handle = ::CreateEventA(nullptr, FALSE, FALSE, nullptr);
+    OwnedHandle handle{::CreateEventA(nullptr, FALSE, FALSE, nullptr)};
 };
 
-EmbeddedEvent::EmbeddedEvent() {
-    static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
-    std::construct_at(reinterpret_cast<Impl*>(storage_));
-}
-
-EmbeddedEvent::~EmbeddedEvent() {
-    ::CloseHandle(Own().handle);
-}
-
-EmbeddedEvent::Impl& EmbeddedEvent::Own() {
-    return *std::launder(reinterpret_cast<Impl*>(storage_));
-}
+EmbeddedEvent::EmbeddedEvent() = default;
+EmbeddedEvent::~EmbeddedEvent() = default;
 
 void EmbeddedEvent::Reset(const std::shared_ptr<CompletionSource>& /*source*/) {
-    ::ResetEvent(Own().handle);
+    ::ResetEvent(impl_->handle.Get());
 }
 
 void EmbeddedEvent::Signal() {
-    ::SetEvent(Own().handle);
+    ::SetEvent(impl_->handle.Get());
 }
 
 bool EmbeddedEvent::Wait(std::uint32_t timeout) {
-    return ::WaitForSingleObject(Own().handle, timeout) == WAIT_OBJECT_0;
+    return ::WaitForSingleObject(impl_->handle.Get(), timeout) == WAIT_OBJECT_0;
 }
 
 struct RecursiveMutex::Impl {
@@ -138,25 +127,15 @@ struct RecursiveMutex::Impl {
     CRITICAL_SECTION section{};
 };
 
-RecursiveMutex::RecursiveMutex() {
-    static_assert(sizeof(Impl) <= ImplSize && alignof(Impl) <= alignof(void*));
-    std::construct_at(reinterpret_cast<Impl*>(storage_));
-}
-
-RecursiveMutex::~RecursiveMutex() {
-    std::destroy_at(&Own());
-}
-
-RecursiveMutex::Impl& RecursiveMutex::Own() {
-    return *std::launder(reinterpret_cast<Impl*>(storage_));
-}
+RecursiveMutex::RecursiveMutex() = default;
+RecursiveMutex::~RecursiveMutex() = default;
 
 void RecursiveMutex::lock() {
-    ::EnterCriticalSection(&Own().section);
+    ::EnterCriticalSection(&impl_->section);
 }
 
 void RecursiveMutex::unlock() {
-    ::LeaveCriticalSection(&Own().section);
+    ::LeaveCriticalSection(&impl_->section);
 }
 
 }  // namespace Varnholt::Platform

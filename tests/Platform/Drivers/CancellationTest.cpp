@@ -11,6 +11,7 @@
 #include "Platform/TestThread.h"
 #include "Platform/Threads.h"
 #include "SimulatedBus.h"
+#include "Support/MeasuredBytes.h"
 #if !defined(_WIN32)
 #include "VirtualClock.h"
 #endif
@@ -74,7 +75,7 @@ class Round final {
         Start(reads_[0]);
         Collect(reads_[0]);
         EXPECT_EQ(collected_, instrument_.WithCommands([this](Simulator::Commands& commands) {
-            return commands.Answers().Expected(0, collected_.size());
+            return MeasuredBytes(commands, collected_.size());
         })) << "lost or repeated data";
         EXPECT_TRUE(files_->CloseFile(pipe_));
         EXPECT_TRUE(files_->CloseFile(main_));

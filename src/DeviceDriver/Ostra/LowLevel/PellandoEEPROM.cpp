@@ -2,7 +2,7 @@
 
 #include <algorithm>
 #include <cstddef>
-#include <exception>
+#include <string>
 #include <utility>
 
 #include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
@@ -80,20 +80,9 @@ PellandoEEPROM::PellandoEEPROM(const SmartPointer<PellandoFunctionality>& instru
 TRACED
 
 PellandoEEPROM::~PellandoEEPROM() {
-    std::string reason;
     try {
         DumpLog();
-        return;
-    } catch (const std::exception& exception) {
-        reason = exception.what();
-    } catch (...) {
-    }
-    try {
-        if (reportLostLog_) {
-            reportLostLog_(reason);
-        }
-    } catch (...) {
-        // Nobody is left to tell.
+    } catch (...) {  // nobody is left to tell
     }
 }
 
@@ -103,10 +92,6 @@ void PellandoEEPROM::SetupCalibrationData(const Bytes& image) try {
     calibration_.SetName(CalibrationName);
 }
 TRACED
-
-void PellandoEEPROM::ReportLostLog(LostLogHandler handler) {
-    reportLostLog_ = std::move(handler);
-}
 
 bool PellandoEEPROM::IsEEPROMProperty(std::uint16_t id) {
     return ConfigurationDataConverter::IsLogParameter(id) ||

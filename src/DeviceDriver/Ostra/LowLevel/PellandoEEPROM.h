@@ -2,8 +2,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <functional>
-#include <string>
 #include <vector>
 
 #include "DeviceDriver/Generic/Configuration/Properties.h"
@@ -33,7 +31,7 @@ class PellandoEEPROM {
         const Varnholt::Utilities::Tools::SmartPointer<PellandoFunctionality>& instrument);
     PellandoEEPROM(const PellandoEEPROM&) = delete;
     PellandoEEPROM& operator=(const PellandoEEPROM&) = delete;
-    /// Writes the log, always. Throws nothing; see `ReportLostLog`.
+    /// Writes the log, always, and throws nothing: who has to know calls `DumpLog` before.
     virtual ~PellandoEEPROM();
 
     virtual PellandoLog& GetLog();
@@ -88,12 +86,6 @@ class PellandoEEPROM {
     /// Reads the calibration values out of an image of 8192 bytes.
     void SetupCalibrationData(const std::vector<std::uint8_t>& image);
 
-    /// Called by the destructor with the reason when the log could not be written: the changes made to it
-    /// since its last dump are lost, and one of its copies may be incomplete. Called on the destructor's
-    /// thread.
-    using LostLogHandler = std::function<void(const std::string& reason)>;
-    void ReportLostLog(LostLogHandler handler);
-
     static bool IsEEPROMProperty(std::uint16_t id);
 
   private:
@@ -103,7 +95,6 @@ class PellandoEEPROM {
     Varnholt::Utilities::Tools::SmartPointer<PellandoEAT> eat_;
     std::size_t logArea_ = 0;  ///< bytes that the log may take in the instrument
     Properties calibration_;
-    LostLogHandler reportLostLog_;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

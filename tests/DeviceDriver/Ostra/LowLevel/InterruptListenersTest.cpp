@@ -11,6 +11,7 @@ namespace Varnholt::Tests {
 namespace {
 
 using namespace Platform;
+using DeviceDriver::Generic::EventListener;
 using DeviceDriver::Generic::MessageButtonData;
 using DeviceDriver::Generic::MessageDeviceGone;
 using DeviceDriver::Ostra::LowLevel::InterruptListener;
@@ -31,6 +32,9 @@ struct OverNative {
     static constexpr bool IsUsbIo = false;
     static constexpr std::uint32_t Place = Protocol::NativeDriver::InterruptPipe;
     static std::unique_ptr<Listener> Make(const UsbIoPipe&) { return std::make_unique<Listener>("native/1"); }
+    static std::shared_ptr<EventListener> Receiver(EventListener& receiver) {
+        return {std::shared_ptr<void>(), &receiver};
+    }
 };
 
 struct OverUsbIo {
@@ -42,6 +46,7 @@ struct OverUsbIo {
         listener->SetPipe(pipe);
         return listener;
     }
+    static EventListener* Receiver(EventListener& receiver) { return &receiver; }
 };
 
 template <class Transport>
@@ -62,7 +67,7 @@ class InterruptListeners : public DriverTest {
         }
     }
     void Start() {
-        listener_->SetListener(&receiver_);
+        listener_->SetListener(Transport::Receiver(receiver_));
         listener_->Start();
     }
     void WaitForMessages(std::size_t count) {
@@ -109,7 +114,7 @@ TYPED_TEST(InterruptListeners, TurnReadsIntoMessages) {
         RecordingListener messages;
         this->Script(row.reads);
         const auto watching = TypeParam::Make(this->pipe_);
-        watching->SetListener(&messages);
+        watching->SetListener(TypeParam::Receiver(messages));
         EXPECT_FALSE(watching->IsTouched());
         watching->Start();
         WaitUntil([&] { return messages.Codes().size() >= row.messages.size(); });
@@ -182,7 +187,7 @@ TYPED_TEST(InterruptListeners, AreNotHeldUpByAReceiverThatDoesNotReturn) {
 
 TYPED_TEST(InterruptListeners, WorkOnTheCallersThreadToo) {
     this->Script({Press, Gone});
-    this->listener_->SetListener(&this->receiver_);
+    this->listener_->SetListener(TypeParam::Receiver(this->receiver_));
     this->listener_->Listen();
     this->listener_->DispatchEvent(1);
     this->listener_->DispatchEvent(0);

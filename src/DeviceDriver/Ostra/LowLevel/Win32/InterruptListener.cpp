@@ -84,11 +84,6 @@ void InterruptListener::SetListener(std::shared_ptr<EventListener> receiver) try
 }
 TRACED
 
-void InterruptListener::SetListener(EventListener* receiver) try {
-    watch_->SetReceiver(std::shared_ptr<EventListener>(std::shared_ptr<void>(), receiver));
-}
-TRACED
-
 void InterruptListener::ClearListener() try { watch_->SetReceiver(nullptr); }
 TRACED
 

@@ -28,8 +28,6 @@ class InterruptListener final {
 
     /// The thread keeps the receiver alive while it delivers.
     void SetListener(std::shared_ptr<Generic::EventListener> receiver);
-    /// The receiver must outlive the thread or be cleared in time.
-    void SetListener(Generic::EventListener* receiver);
     void ClearListener();
 
     /// True once interrupt data have arrived.

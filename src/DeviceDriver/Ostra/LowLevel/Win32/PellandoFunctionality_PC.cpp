@@ -16,6 +16,7 @@
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
+namespace DataStage = Protocol::DataStage;
 namespace NativeDriver = Protocol::NativeDriver;
 using Generic::Utilities::IOException;
 using Protocol::Request;
@@ -133,34 +134,34 @@ TRACED
 
 void PellandoFunctionality_PC::SetMeasureParameters(const Bytes2& p1, const Bytes2& p2, const Bytes2& p3,
                                                     std::uint8_t p4) try {
-    Put(0, p1);
-    Put(2, p2);
-    Put(4, p3);
-    record_.data[6] = p4;
-    Send(Request::SetMeasureParameters, 8);
+    Put(DataStage::P1, p1);
+    Put(DataStage::P2, p2);
+    Put(DataStage::P3, p3);
+    record_.data[DataStage::P4] = p4;
+    Send(Request::SetMeasureParameters, DataStage::MeasureParametersSize);
 }
 TRACED
 
 void PellandoFunctionality_PC::GetMeasureParameters(Bytes2& p1, Bytes2& p2, Bytes2& p3, std::uint8_t& p4,
                                                     std::uint8_t& p5) try {
-    Receive(Request::GetMeasureParameters, 8);
-    Take(0, p1);
-    Take(2, p2);
-    Take(4, p3);
-    p4 = record_.data[6];
-    p5 = record_.data[7];
+    Receive(Request::GetMeasureParameters, DataStage::MeasureParametersSize);
+    Take(DataStage::P1, p1);
+    Take(DataStage::P2, p2);
+    Take(DataStage::P3, p3);
+    p4 = record_.data[DataStage::P4];
+    p5 = record_.data[DataStage::P5];
 }
 TRACED
 
 void PellandoFunctionality_PC::SetMeasureMode(std::uint8_t mode) try {
     record_.data[0] = mode;
-    Send(Request::SetMeasureMode, 1);
+    Send(Request::SetMeasureMode, DataStage::SetModeSize);
 }
 TRACED
 
 void PellandoFunctionality_PC::GetMeasureMode(std::uint8_t& m1, std::uint8_t& m2, std::uint8_t& m3,
                                               std::uint8_t& m4, std::uint8_t& m5, std::uint8_t& m6) try {
-    Receive(Request::GetMeasureMode, 6);
+    Receive(Request::GetMeasureMode, DataStage::MeasureModeSize);
     m1 = record_.data[0];
     m2 = record_.data[1];
     m3 = record_.data[2];
@@ -178,9 +179,9 @@ TRACED
 
 void PellandoFunctionality_PC::WriteEEPROM(Request request, const Bytes4& address, const Bytes2& length,
                                            const std::uint8_t* data, std::uint32_t count) try {
-    Put(0, address);
-    Put(4, length);
-    Send(request, 8);
+    Put(DataStage::Address, address);
+    Put(DataStage::Length, length);
+    Send(request, DataStage::MemoryRequestSize);
     device_->WriteData(data, count, WaitLimit(std::uint64_t{count} * 10));
     const std::uint8_t end = 0x00;
     device_->WriteData(&end, sizeof end, 0);
@@ -190,23 +191,23 @@ TRACED
 
 void PellandoFunctionality_PC::ReadEEPROM(const Bytes4& address, const Bytes2& length, std::uint8_t* data,
                                           std::uint32_t count) try {
-    Put(0, address);
-    Put(4, length);
-    Send(Request::ReadEeprom, 8);
+    Put(DataStage::Address, address);
+    Put(DataStage::Length, length);
+    Send(Request::ReadEeprom, DataStage::MemoryRequestSize);
     device_->ReadData(data, count, WaitLimit(count));
 }
 TRACED
 
 void PellandoFunctionality_PC::WriteCPLD(const Bytes2& c1, const Bytes2& c2, const Bytes2& c3) try {
-    Put(0, c1);
-    Put(2, c2);
-    Put(4, c3);
-    Send(Request::WriteCpld, 6);
+    Put(DataStage::C1, c1);
+    Put(DataStage::C2, c2);
+    Put(DataStage::C3, c3);
+    Send(Request::WriteCpld, DataStage::WriteCpldSize);
 }
 TRACED
 
 void PellandoFunctionality_PC::ReadCPLD(Bytes2& value) try {
-    Receive(Request::ReadCpld, 2);
+    Receive(Request::ReadCpld, DataStage::ReadCpldSize);
     Take(0, value);
 }
 TRACED
@@ -228,17 +229,17 @@ TRACED
 
 void PellandoFunctionality_PC::GetMISC(std::uint8_t& m1, Bytes2& m2, std::uint8_t& m3, Bytes2& m4,
                                        Bytes2& m5) try {
-    Receive(Request::GetMisc, 8);
-    Take(0, m2);
-    Take(2, m4);
-    Take(4, m5);
-    m1 = record_.data[6];
-    m3 = record_.data[7];
+    Receive(Request::GetMisc, DataStage::MiscSize);
+    Take(DataStage::M2, m2);
+    Take(DataStage::M4, m4);
+    Take(DataStage::M5, m5);
+    m1 = record_.data[DataStage::M1];
+    m3 = record_.data[DataStage::M3];
 }
 TRACED
 
 void PellandoFunctionality_PC::GetChipID(std::uint8_t* id) try {
-    Transfer(Request::GetChipId, NativeDriver::DirectionIn, id, 8);
+    Transfer(Request::GetChipId, NativeDriver::DirectionIn, id, DataStage::ChipIdSize);
 }
 TRACED
 
@@ -246,7 +247,7 @@ void PellandoFunctionality_PC::Reset(const Bytes2& code) try {
     // The code's low byte; the second byte of the data area gets it as well and is not sent.
     record_.data[0] = code[1];
     record_.data[1] = code[1];
-    Send(Request::Reset, 1);
+    Send(Request::Reset, DataStage::ResetSize);
 }
 TRACED
 

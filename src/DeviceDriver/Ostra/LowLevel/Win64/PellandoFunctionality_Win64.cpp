@@ -19,6 +19,7 @@
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
+namespace DataStage = Protocol::DataStage;
 using namespace Protocol::UsbIoDriver;
 using Generic::Utilities::DataException;
 using Generic::Utilities::IOException;
@@ -34,15 +35,6 @@ namespace {
 constexpr std::uint32_t CommandPause = 1;  // milliseconds before every vendor request
 constexpr std::uint64_t MillisecondsPerSecond = 1000;
 constexpr std::uint64_t ReadGrace = 5000;  // milliseconds on top of every time-out
-
-// Data stages, bytes.
-constexpr std::size_t MeasureParametersSize = 8;
-constexpr std::size_t MeasureModeSize = 6;
-constexpr std::size_t MemoryRequestSize = 8;
-constexpr std::size_t CpldWriteSize = 6;
-constexpr std::size_t CpldReadSize = 2;
-constexpr std::size_t MiscSize = 8;
-constexpr std::size_t ChipIdSize = 8;
 
 // Scans.
 constexpr std::uint32_t ScanTransferSize = MaximumTransferSize;
@@ -187,24 +179,24 @@ TRACED
 
 void PellandoFunctionality_Win64::SetMeasureParameters(const Bytes2& p1, const Bytes2& p2, const Bytes2& p3,
                                                        std::uint8_t p4) try {
-    Bytes data(MeasureParametersSize);
-    Put(data, 0, p1);
-    Put(data, 2, p2);
-    Put(data, 4, p3);
-    data[6] = p4;
+    Bytes data(DataStage::MeasureParametersSize);
+    Put(data, DataStage::P1, p1);
+    Put(data, DataStage::P2, p2);
+    Put(data, DataStage::P3, p3);
+    data[DataStage::P4] = p4;
     VendorOutRequest(Request::SetMeasureParameters, data);
 }
 TRACED
 
 void PellandoFunctionality_Win64::GetMeasureParameters(Bytes2& p1, Bytes2& p2, Bytes2& p3, std::uint8_t& p4,
                                                        std::uint8_t& p5) try {
-    Bytes data(MeasureParametersSize);
+    Bytes data(DataStage::MeasureParametersSize);
     VendorInRequest(Request::GetMeasureParameters, data);
-    Take(data, 0, p1);
-    Take(data, 2, p2);
-    Take(data, 4, p3);
-    p4 = data[6];
-    p5 = data[7];
+    Take(data, DataStage::P1, p1);
+    Take(data, DataStage::P2, p2);
+    Take(data, DataStage::P3, p3);
+    p4 = data[DataStage::P4];
+    p5 = data[DataStage::P5];
 }
 TRACED
 
@@ -215,7 +207,7 @@ TRACED
 
 void PellandoFunctionality_Win64::GetMeasureMode(std::uint8_t& m1, std::uint8_t& m2, std::uint8_t& m3,
                                                  std::uint8_t& m4, std::uint8_t& m5, std::uint8_t& m6) try {
-    Bytes data(MeasureModeSize);
+    Bytes data(DataStage::MeasureModeSize);
     VendorInRequest(Request::GetMeasureMode, data);
     m1 = data[0];
     m2 = data[1];
@@ -240,9 +232,9 @@ TRACED
 
 void PellandoFunctionality_Win64::WriteMemory(Request request, const Bytes4& address, const Bytes2& length,
                                               const std::uint8_t* data, std::uint32_t count) {
-    Bytes block(MemoryRequestSize);
-    Put(block, 0, address);
-    Put(block, 4, length);
+    Bytes block(DataStage::MemoryRequestSize);
+    Put(block, DataStage::Address, address);
+    Put(block, DataStage::Length, length);
     VendorOutRequest(request, block);
     WriteData(data, count);
     const std::uint8_t end = 0;
@@ -252,25 +244,25 @@ void PellandoFunctionality_Win64::WriteMemory(Request request, const Bytes4& add
 
 void PellandoFunctionality_Win64::ReadEEPROM(const Bytes4& address, const Bytes2& length, std::uint8_t* data,
                                              std::uint32_t count) try {
-    Bytes block(MemoryRequestSize);
-    Put(block, 0, address);
-    Put(block, 4, length);
+    Bytes block(DataStage::MemoryRequestSize);
+    Put(block, DataStage::Address, address);
+    Put(block, DataStage::Length, length);
     VendorOutRequest(Request::ReadEeprom, block);
     ReadData(data, count, count);
 }
 TRACED
 
 void PellandoFunctionality_Win64::WriteCPLD(const Bytes2& c1, const Bytes2& c2, const Bytes2& c3) try {
-    Bytes data(CpldWriteSize);
-    Put(data, 0, c1);
-    Put(data, 2, c2);
-    Put(data, 4, c3);
+    Bytes data(DataStage::WriteCpldSize);
+    Put(data, DataStage::C1, c1);
+    Put(data, DataStage::C2, c2);
+    Put(data, DataStage::C3, c3);
     VendorOutRequest(Request::WriteCpld, data);
 }
 TRACED
 
 void PellandoFunctionality_Win64::ReadCPLD(Bytes2& value) try {
-    Bytes data(CpldReadSize);
+    Bytes data(DataStage::ReadCpldSize);
     VendorInRequest(Request::ReadCpld, data);
     Take(data, 0, value);
 }
@@ -284,18 +276,18 @@ TRACED
 
 void PellandoFunctionality_Win64::GetMISC(std::uint8_t& m1, Bytes2& m2, std::uint8_t& m3, Bytes2& m4,
                                           Bytes2& m5) try {
-    Bytes data(MiscSize);
+    Bytes data(DataStage::MiscSize);
     VendorInRequest(Request::GetMisc, data);
-    Take(data, 0, m2);
-    Take(data, 2, m4);
-    Take(data, 4, m5);
-    m1 = data[6];
-    m3 = data[7];
+    Take(data, DataStage::M2, m2);
+    Take(data, DataStage::M4, m4);
+    Take(data, DataStage::M5, m5);
+    m1 = data[DataStage::M1];
+    m3 = data[DataStage::M3];
 }
 TRACED
 
 void PellandoFunctionality_Win64::GetChipID(std::uint8_t* id) try {
-    Bytes data(ChipIdSize);
+    Bytes data(DataStage::ChipIdSize);
     VendorInRequest(Request::GetChipId, data);
     std::copy(data.begin(), data.end(), id);
 }
