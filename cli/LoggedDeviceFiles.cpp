@@ -94,7 +94,7 @@ void LoggedDeviceFiles::Tell(const Description& describe, std::uint32_t transfer
 }
 
 template <class Start>
-bool LoggedDeviceFiles::StartTransfer(Handle file, const Overlapped& record, Description describe,
+bool LoggedDeviceFiles::StartTransfer(Handle file, const Overlapped& record, const Description& describe,
                                       Start start) {
     {
         // Before the start: its end may be learnt of on another thread.

@@ -45,7 +45,7 @@ class LoggedDeviceFiles final : public Platform::DeviceFileSystem {
     };
 
     template <class Start>
-    bool StartTransfer(Handle file, const Overlapped& record, Description describe, Start start);
+    bool StartTransfer(Handle file, const Overlapped& record, const Description& describe, Start start);
     void Tell(const Description& describe, std::uint32_t transferred, bool succeeded);
 
     Platform::DeviceFileSystem& below_;

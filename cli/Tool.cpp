@@ -36,7 +36,7 @@ Exit codes:
 /// parser keeps what an option excludes in the order of addresses.
 class HelpFormatter final : public CLI::Formatter {
     std::string make_option_opts(const CLI::Option* option) const override {
-        const std::string text = Formatter::make_option_opts(option);
+        std::string text = Formatter::make_option_opts(option);
         const std::string label = " " + get_label("Excludes") + ":";
         const std::size_t at = text.find(label);
         if (at == std::string::npos) {

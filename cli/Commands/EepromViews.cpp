@@ -166,7 +166,7 @@ std::string TextOfUnreadable(const ImageDiff& diff, const std::string& a, const 
     std::string text;
     for (const auto& [name, reason] : {std::pair(a, diff.unreadableA), std::pair(b, diff.unreadableB)}) {
         if (!reason.empty()) {
-            text += (text.empty() ? "" : "; ") + name + ": " + reason;
+            text.append(text.empty() ? "" : "; ").append(name).append(": ").append(reason);
         }
     }
     return text;

@@ -78,8 +78,8 @@ sigset_t WatchedSignals() {
 
 void SecureStandardStreams() {
     Platform::SecureStandardStreams();
-    ::signal(SIGPIPE, SIG_IGN);
-    ::signal(SIGXFSZ, SIG_IGN);
+    static_cast<void>(::signal(SIGPIPE, SIG_IGN));
+    static_cast<void>(::signal(SIGXFSZ, SIG_IGN));
 }
 
 StreamFacts FactsOfStandardOutput() {
@@ -93,7 +93,7 @@ StreamFacts FactsOfStandardError() {
 void SetStandardOutputBinary() {}
 
 std::string QuotedFileName(const std::string& name) {
-    const std::string file = (name.starts_with('-') ? "./" : "") + name;
+    std::string file = (name.starts_with('-') ? "./" : "") + name;
     const auto isPlain = [](unsigned char c) {
         return std::isalnum(c) != 0 ||
                std::string_view("_-./:=@%+,").find(static_cast<char>(c)) != std::string_view::npos;
@@ -145,7 +145,8 @@ SignalWatch::SignalWatch(std::function<void()> whenAsked)
 
 SignalWatch::~SignalWatch() {
     state_->ending = true;
-    ::pthread_kill(state_->thread.native_handle(), SIGTERM);
+    // Blocked there, it only ends the wait for a signal.
+    ::pthread_kill(state_->thread.native_handle(), SIGTERM);  // NOLINT(bugprone-bad-signal-to-kill-thread)
     state_->thread.join();
     ::pthread_sigmask(SIG_SETMASK, &state_->maskBefore, nullptr);
 }

@@ -89,7 +89,7 @@ EepromImage WithEmptyLog(const EepromImage& image) {
         RefuseOddTable();
     }
     model.Get().DumpLog();
-    const EepromImage edited = model.Contents();
+    EepromImage edited = model.Contents();
     ImageModel proof(edited);
     const LogCopies copies = ReadLogCopies(edited);
     const Properties& wanted = model.Log();

@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <charconv>
 #include <cmath>
+#include <iterator>
 #include <limits>
 
 #include "Service/Failure.h"
@@ -102,9 +103,7 @@ Assignment ParseAssignment(const std::string& text) {
 
 std::vector<Assignment> ParseAssignments(const std::vector<std::string>& texts) {
     std::vector<Assignment> assignments;
-    for (const std::string& text : texts) {
-        assignments.push_back(ParseAssignment(text));
-    }
+    std::ranges::transform(texts, std::back_inserter(assignments), ParseAssignment);
     return assignments;
 }
 
@@ -117,19 +116,13 @@ Property ParseValue(const Assignment& assignment, const Property& pattern) {
                       "elements are separated by commas");
     }
     Property value = pattern;
-    if (IsFloat(pattern)) {
-        std::vector<float> numbers;
-        for (const std::string& part : parts) {
-            numbers.push_back(ParseFloat(assignment, part));
-        }
+    const auto assign = [&](auto parse) {
+        std::vector<decltype(parse(assignment, parts.front()))> numbers;
+        std::ranges::transform(parts, std::back_inserter(numbers),
+                               [&](const std::string& part) { return parse(assignment, part); });
         value.AssignInternal(numbers, pattern.GetType());
-    } else {
-        std::vector<std::int32_t> numbers;
-        for (const std::string& part : parts) {
-            numbers.push_back(ParseLong(assignment, part));
-        }
-        value.AssignInternal(numbers, pattern.GetType());
-    }
+    };
+    IsFloat(pattern) ? assign(ParseFloat) : assign(ParseLong);
     return value;
 }
 
