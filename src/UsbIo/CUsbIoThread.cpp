@@ -70,17 +70,14 @@ std::uint32_t CUsbIoThread::ThreadProcedure(void* self) {
     } catch (...) {
         // There is nothing left to end.
     }
-    const Platform::Handle handle = thread.threadHandle_.exchange(NoHandle);
-    if (handle != NoHandle) {
-        Platform::Close(handle);
-    }
+    const Platform::OwnedHandle own(thread.threadHandle_.exchange(NoHandle));
     return 0;
 }
 
 bool CUsbIoThread::ShutdownThread() {
     const bool onThreadItself = threadHandle_ != NoHandle && threadId_.load() == std::this_thread::get_id();
-    const Platform::Handle handle = onThreadItself ? NoHandle : threadHandle_.exchange(NoHandle);
-    if (handle == NoHandle && !onThreadItself) {
+    const Platform::OwnedHandle handle(onThreadItself ? NoHandle : threadHandle_.exchange(NoHandle));
+    if (!handle && !onThreadItself) {
         return true;
     }
     TerminateFlag = true;
@@ -90,9 +87,7 @@ bool CUsbIoThread::ShutdownThread() {
     if (onThreadItself) {
         return false;
     }
-    const bool ended = Platform::Wait(handle, Platform::Infinite) == Platform::WaitResult::Signalled;
-    Platform::Close(handle);
-    return ended;
+    return Platform::Wait(handle.Get(), Platform::Infinite) == Platform::WaitResult::Signalled;
 }
 
 bool CUsbIoThread::MustEnd() const {

@@ -154,35 +154,49 @@ TYPED_TEST(InterruptListeners, StopAtOnce) {
 }
 
 TYPED_TEST(InterruptListeners, StopFromInsideAMessage) {
-    std::atomic<bool> stopped = false;
+    const OwnedHandle stopped(MakeAutoResetEvent()), release(MakeAutoResetEvent());
     this->Script({Press});
     this->receiver_.onMessage = [&](std::uint32_t) {
         EXPECT_TRUE(this->listener_->IsTouched());
         this->StopWithin(0);
-        stopped = true;
+        SignalAndWait(stopped.Get(), release.Get(), Infinite);
     };
     this->Start();
-    WaitUntil([&] { return stopped.load(); });
+    EXPECT_EQ(Wait(stopped.Get(), 10'000), WaitResult::Signalled);
+    const Stopwatch watch(this->clock_);
+    this->listener_.reset();
+    watch.ExpectAtMost(0);  // the thread is nobody's any more
+    SignalEvent(release.Get());
     SleepMilliseconds(100);
     EXPECT_THAT(this->receiver_.Codes(), ElementsAre(Button));
     EXPECT_EQ(this->driver_.Running(this->Place), 0U);
-    this->listener_.reset();
     this->pipe_ = {};
     EXPECT_EQ(this->driver_.OpenFiles(), 0U) << "nobody keeps the pipe";
 }
 
 /// The thread comes back when nobody waits for it any more, and must find its things in place.
-TYPED_TEST(InterruptListeners, AreNotHeldUpByAReceiverThatDoesNotReturn) {
-    const OwnedHandle release(MakeAutoResetEvent());
-    this->receiver_.onMessage = [&](std::uint32_t) { Wait(release.Get(), Infinite); };
-    this->Script({Press});
-    this->Start();
-    this->WaitForMessages(1);
-    this->StopWithin(11'000);
-    EXPECT_FALSE(TypeParam::IsUsbIo && this->pipe_->IsOpen());
-    SignalEvent(release.Get());
-    this->listener_->ClearListener();  // over USBIO, after the message where the thread could not be ended
-    SleepMilliseconds(10);
+TYPED_TEST(InterruptListeners, AreNotHeldUpByAReceiverOrADriverThatDoesNotReturn) {
+    const OwnedHandle held(MakeAutoResetEvent()), release(MakeAutoResetEvent());
+    const auto hold = [&] { SignalAndWait(held.Get(), release.Get(), Infinite); };
+    for (const bool byDriver : {false, true}) {
+        RecordingListener receiver;
+        receiver.onMessage = [&](std::uint32_t) { hold(); };
+        const UsbIoPipe pipe(new UsbIo::CUsbIoPipe);
+        EXPECT_EQ(pipe->Bind(0, Protocol::InterruptInEndpoint, nullptr, nullptr), 0U);
+        const auto listener = TypeParam::Make(pipe);
+        this->Script({byDriver ? Answer{.data = {1}, .onStart = hold} : Press});
+        listener->SetListener(TypeParam::Receiver(receiver));
+        listener->Start();
+        EXPECT_EQ(Wait(held.Get(), 10'000), WaitResult::Signalled);
+        const Stopwatch watch(this->clock_);
+        listener->Stop();
+        watch.ExpectAtMost(11'000);
+        EXPECT_FALSE(TypeParam::IsUsbIo && pipe->IsOpen());
+        SignalEvent(release.Get());
+        listener->ClearListener();  // over USBIO, after the message where the thread could not be ended
+        SleepMilliseconds(10);
+        EXPECT_EQ(receiver.Codes().size(), byDriver ? 0U : 1U) << "what comes behind the end is no news";
+    }
 }
 
 TYPED_TEST(InterruptListeners, WorkOnTheCallersThreadToo) {

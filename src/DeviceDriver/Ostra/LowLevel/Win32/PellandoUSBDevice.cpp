@@ -129,12 +129,12 @@ class PellandoUSBDevice::Core final : public EventListener {
 
 PellandoUSBDevice::PellandoUSBDevice(EventListener* listener, const std::string& devicePath) try
     : core_(std::make_shared<Core>(listener, devicePath)), interruptListener_(devicePath) {
+    const ScopedLock held(core_->lock);
     try {
-        const ScopedLock held(core_->lock);
         SetupInterruptListener();
     } catch (...) {
-        core_->isClosed =
-            true;  // a message may be on its way to the listener of an owner that gets no device
+        // A message may wait for the lock, and its receiver belongs to an owner that gets no device.
+        core_->isClosed = true;
         throw;
     }
 }

@@ -1,5 +1,6 @@
 #include <atomic>
 #include <functional>
+#include <thread>
 
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
@@ -170,10 +171,19 @@ TEST_F(NativeDevice, SaysNothingOfAButtonThatWasUsed) {
 
 TEST_F(NativeDevice, ThatCannotBeOpenedLeavesNothingBehind) {
     const auto expectFailure = [&](const std::string& text) {
-        ExpectThrow<IOException>(text, [] { PellandoUSBDevice device(nullptr, Path); });
+        ExpectThrow<IOException>(text, [&] { PellandoUSBDevice device(&listener_, Path); });
         EXPECT_EQ(driver_.OpenFiles(), 0u);
-        EXPECT_THAT(driver_.TakeTransfers(), IsEmpty());
+        EXPECT_THAT(listener_.Codes(), IsEmpty()) << "who gets no device gets no messages";
     };
+    // The thread has reported its start and waits with a message when that is not seen.
+    driver_.Script(InterruptPipe, {.data = {1}, .after = 1});
+    InstallCallFilter([waits = 0, opener = std::this_thread::get_id()](std::string_view call) mutable {
+        const bool fails = call == "Wait" && std::this_thread::get_id() == opener && ++waits == 2;
+        SleepMilliseconds(fails ? 10 : 0);
+        return fails ? Errors::NoSystemResources : Errors::Success;
+    });
+    expectFailure("interrupt listener thread had timeout");
+    driver_.TakeTranscript();
     FailCalls("StartThread");
     expectFailure("could not create interrupt listener thread");
     InstallCallFilter({});
@@ -183,6 +193,7 @@ TEST_F(NativeDevice, ThatCannotBeOpenedLeavesNothingBehind) {
         driver_.RefuseOpen(Path + pipe, Errors::FileNotFound);
         expectFailure("could not open pipe:" + ErrorSuffix(Errors::FileNotFound));
     }
+    EXPECT_THAT(driver_.TakeTransfers(), IsEmpty());
 }
 
 TEST_F(NativeDevice, ClosesItsPipesWhenTheInstrumentIsGone) {
@@ -265,24 +276,33 @@ TEST_F(NativeDevice, MayBeUsedAndClosedFromInsideAMessage) {
 }
 
 /// Closing is bounded even if somebody holds the device lock and the listener's thread waits for it; that
-/// thread then finds everything it touches in place, and its message is dropped.
+/// thread then finds everything it touches in place, and its message is dropped. Without a listener it does
+/// not wait at all.
 TEST_F(NativeDevice, ClosesInTimeWhileSomebodyHoldsTheDeviceLock) {
-    for (const bool messageWaits : {false, true}) {
+    const struct {
+        bool isRemoved, isPressed;
+        std::uint64_t most;
+        std::size_t transfers;
+    } cases[] = {{false, false, 5, 3}, {false, true, 11'001, 0}, {true, true, 5, 2}};
+    for (const auto& [isRemoved, isPressed, most, transfers] : cases) {
         auto device = Open();
+        if (isRemoved) {
+            device->RemoveListener(&listener_);
+        }
         driver_.TakeTranscript();
         {
             Mutex mutex("native1");
             const ScopedLock held(mutex);
-            if (messageWaits) {
+            if (isPressed) {
                 driver_.Complete(InterruptPipe, ButtonData);
                 SleepMilliseconds(10);
             }
             const Stopwatch watch(clock_);
             BackgroundThread closer([&] { device.reset(); });
             WaitUntil([&] { return closer.HasEnded(); });
-            watch.ExpectAtMost(messageWaits ? 11'001 : 5);
+            watch.ExpectAtMost(most);
             EXPECT_EQ(driver_.OpenFiles(), 0u);
-            EXPECT_THAT(driver_.TakeTransfers(), testing::SizeIs(messageWaits ? 0 : 3)) << "as ever";
+            EXPECT_THAT(driver_.TakeTransfers(), testing::SizeIs(transfers)) << "as ever";
         }
         SleepMilliseconds(10);
         EXPECT_THAT(listener_.Codes(), IsEmpty());
