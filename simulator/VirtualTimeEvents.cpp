@@ -1,8 +1,8 @@
 #include <algorithm>
 
 #include "Platform/ErrorCodes.h"
-#include "Platform/Linux/RealScheduler.h"
 #include "Platform/Linux/SystemThread.h"
+#include "Platform/RealScheduler.h"
 #include "VirtualTime.h"
 
 namespace Varnholt::Simulator {

@@ -47,6 +47,7 @@ TEST_P(Schedulers, ForgetEvents) {
     std::atomic<int> called = 0;
     const auto held = std::make_shared<int>();
     const auto forgotten = scheduler.CallAt(start + 60'000'000, [&called, held] { ++called; });
+    SleepMilliseconds(5);  // what comes now is due before that for which a thread waits
     EventScheduler::EventId own = 0;
     own = scheduler.CallAt(start + 10'000, [&] {
         scheduler.Forget(own);

@@ -1,14 +1,17 @@
 #include "Platform/Linux/RealClock.h"
 
 #include <sched.h>
+#include <sys/prctl.h>
 
 #include <algorithm>
 #include <chrono>
+#include <utility>
 
 #include "Platform/Linux/Dispatcher.h"
+#include "Platform/Linux/HostSignalsBlocked.h"
 #include "Platform/Linux/NoDestructor.h"
-#include "Platform/Linux/RealScheduler.h"
 #include "Platform/Linux/WaitableObject.h"
+#include "Platform/RealScheduler.h"
 
 namespace Varnholt::Platform::Linux {
 
@@ -38,7 +41,16 @@ WallTime RealClock::Wall() {
 }
 
 EventScheduler& RealClock::Scheduler() {
-    return RealScheduler::Instance();
+    static RealScheduler scheduler([](std::function<void()> run) {
+        const HostSignalsBlocked blocked;
+        return std::thread([run = std::move(run)] {
+            // Events are for their time, not for up to 50 us later.
+            constexpr unsigned long ExactTimers = 1;
+            prctl(PR_SET_TIMERSLACK, ExactTimers);
+            run();
+        });
+    });
+    return scheduler;
 }
 
 /// False when there are no events for the thread to handle.

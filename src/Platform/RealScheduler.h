@@ -1,7 +1,5 @@
 #pragma once
 
-#include <pthread.h>
-
 #include <condition_variable>
 #include <map>
 #include <mutex>
@@ -9,19 +7,20 @@
 #include <utility>
 
 #include "Platform/EventScheduler.h"
-#include "Platform/Linux/Clock.h"
 
-namespace Varnholt::Platform::Linux {
+namespace Varnholt::Platform {
 
 /// Names events across all schedulers, so that an event of one is never taken for an event of another.
 EventScheduler::EventId NewEventId();
 
-/// Events in real time, called on a thread that exists while events wait.
+/// Events in real time, called on a thread that exists while events wait. It stands on the language's own
+/// threads: faults that a test places in the platform's calls must not hit a simulated device as well.
 class RealScheduler final : public EventScheduler {
   public:
-    static RealScheduler& Instance();
+    /// Starts a thread that calls `run`; may throw where there can be none.
+    using Starter = std::thread (*)(std::function<void()> run);
 
-    RealScheduler() = default;
+    explicit RealScheduler(Starter startThread) : startThread_(startThread) {}
     /// Events that still wait are dropped; the thread is seen to its end.
     ~RealScheduler() override;
     RealScheduler(const RealScheduler&) = delete;
@@ -33,21 +32,21 @@ class RealScheduler final : public EventScheduler {
 
   private:
     using Hold = std::unique_lock<std::mutex>;
-    static void* RunThread(void* scheduler);
     void CallEvents();
     void CallNext(Hold& hold);
     void StartThread();
     void JoinEndedThread(Hold& hold);
     void WaitForEnd(Hold& hold);
 
+    const Starter startThread_;
     std::mutex lock_;  // of everything below; nothing else is locked while it is held
-    std::map<std::pair<Microseconds, EventId>, std::function<void()>> events_;
+    std::map<std::pair<std::uint64_t, EventId>, std::function<void()>> events_;
     EventId running_ = 0;
     std::thread::id runner_;             // of the event that is running
     std::condition_variable callEnded_;  // an event's, or the thread's
     std::condition_variable changed_;    // for the thread
-    enum class ThreadState { None, Running, Ended } threadState_ = ThreadState::None;
-    pthread_t thread_{};
+    std::thread thread_;
+    bool threadRuns_ = false;
 };
 
-}  // namespace Varnholt::Platform::Linux
+}  // namespace Varnholt::Platform

@@ -1,33 +1,24 @@
-#include "Platform/Linux/RealScheduler.h"
-
-#include <sys/prctl.h>
+#include "Platform/RealScheduler.h"
 
 #include <algorithm>
 #include <atomic>
 #include <chrono>
+#include <exception>
 
-#include "Platform/Linux/RealClock.h"
-#include "Platform/Linux/SystemThread.h"
+namespace Varnholt::Platform {
 
-namespace Varnholt::Platform::Linux {
+using std::chrono::microseconds;
+using std::chrono::steady_clock;
+
 namespace {
 
-constexpr Microseconds LongestStep = 3'600'000'000;
-
-std::chrono::steady_clock::time_point At(Microseconds time) {
-    return std::chrono::steady_clock::time_point(std::chrono::microseconds(time));
-}
+constexpr std::uint64_t LongestStep = 3'600'000'000;
 
 }  // namespace
 
 EventScheduler::EventId NewEventId() {
     static std::atomic<EventScheduler::EventId> last = 0;
     return ++last;
-}
-
-RealScheduler& RealScheduler::Instance() {
-    static RealScheduler scheduler;
-    return scheduler;
 }
 
 RealScheduler::~RealScheduler() {
@@ -39,7 +30,8 @@ RealScheduler::~RealScheduler() {
 }
 
 std::uint64_t RealScheduler::Now() {
-    return RealClock::Instance().Now();
+    const auto sinceStart = steady_clock::now().time_since_epoch();
+    return static_cast<std::uint64_t>(std::chrono::floor<microseconds>(sinceStart).count());
 }
 
 EventScheduler::EventId RealScheduler::CallAt(std::uint64_t time, std::function<void()> event) {
@@ -47,7 +39,7 @@ EventScheduler::EventId RealScheduler::CallAt(std::uint64_t time, std::function<
     Hold hold(lock_);
     JoinEndedThread(hold);
     const auto place = events_.emplace(std::pair(time, id), std::move(event)).first;
-    if (threadState_ == ThreadState::None) {
+    if (!thread_.joinable()) {
         StartThread();
     }
     if (place == events_.begin()) {
@@ -77,34 +69,28 @@ void RealScheduler::Forget(EventId id) {
 }
 
 void RealScheduler::StartThread() {
-    threadState_ = ThreadState::Running;
-    if (!StartSystemThread(thread_, RunThread, this)) {
+    try {
+        thread_ = startThread_([this] { CallEvents(); });
+        threadRuns_ = true;
+    } catch (const std::exception&) {
         // Without a thread the events wait for the next call that can have one: late, but not lost.
-        threadState_ = ThreadState::None;
     }
-}
-
-void* RealScheduler::RunThread(void* scheduler) {
-    // Events are for their time, not for up to 50 us later.
-    constexpr unsigned long ExactTimers = 1;
-    prctl(PR_SET_TIMERSLACK, ExactTimers);
-    static_cast<RealScheduler*>(scheduler)->CallEvents();
-    return nullptr;
 }
 
 void RealScheduler::CallEvents() {
     Hold hold(lock_);
     while (!events_.empty()) {
-        const Microseconds now = Now();
-        const Microseconds time = events_.begin()->first.first;
+        const std::uint64_t now = Now();
+        const std::uint64_t time = events_.begin()->first.first;
         if (time > now) {
             // A time so far off that the system's clock could not hold it is approached in steps.
-            changed_.wait_until(hold, At(std::min(time, now + LongestStep)));
+            changed_.wait_until(hold,
+                                steady_clock::time_point(microseconds(std::min(time, now + LongestStep))));
         } else {
             CallNext(hold);
         }
     }
-    threadState_ = ThreadState::Ended;
+    threadRuns_ = false;
     callEnded_.notify_all();
 }
 
@@ -123,20 +109,19 @@ void RealScheduler::CallNext(Hold& hold) {
 }
 
 void RealScheduler::JoinEndedThread(Hold& hold) {
-    if (threadState_ != ThreadState::Ended) {
+    if (threadRuns_ || !thread_.joinable()) {
         return;
     }
-    threadState_ = ThreadState::None;
-    const pthread_t ended = thread_;
+    std::thread ended = std::move(thread_);
     hold.unlock();
-    pthread_join(ended, nullptr);
+    ended.join();
     hold.lock();
 }
 
 void RealScheduler::WaitForEnd(Hold& hold) {
     changed_.notify_one();
-    callEnded_.wait(hold, [this] { return threadState_ != ThreadState::Running || !events_.empty(); });
+    callEnded_.wait(hold, [this] { return !threadRuns_ || !events_.empty(); });
     JoinEndedThread(hold);
 }
 
-}  // namespace Varnholt::Platform::Linux
+}  // namespace Varnholt::Platform
