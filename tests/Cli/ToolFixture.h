@@ -94,10 +94,4 @@ class ToolTest : public testing::TestWithParam<Transport> {
     const TestFolder& folder_ = tool_.folder;
 };
 
-inline std::string NameOfTransport(const testing::TestParamInfo<Transport>& info) {
-    return Name(info.param);
-}
-#define OSTRA_ON_BOTH_TRANSPORTS(Suite) \
-    INSTANTIATE_TEST_SUITE_P(, Suite, testing::Values(Transport::Native, Transport::UsbIo), NameOfTransport)
-
 }  // namespace Varnholt::Tests

@@ -249,13 +249,7 @@ TEST_P(ToolSweep, SucceedsWholeOrFailsWithNothingLost) {
     RecordProperty("cases", cases);
 }
 
-INSTANTIATE_TEST_SUITE_P(All, ToolSweep,
-                         testing::Combine(testing::Values(Transport::Native, Transport::UsbIo),
-                                          testing::Range<std::size_t>(0, std::size(Commands))),
-                         [](const auto& parameter) {
-                             return std::string(Name(std::get<0>(parameter.param))) + "_" +
-                                    Commands[std::get<1>(parameter.param)].name;
-                         });
+OSTRA_SWEEP_BOTH_TRANSPORTS(ToolSweep, Commands);
 
 }  // namespace
 }  // namespace Varnholt::Tests

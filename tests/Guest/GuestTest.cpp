@@ -26,6 +26,7 @@
 #include "ostra.h"
 #include "Platform/HostQueries.h"
 #include "Platform/Usb/UdevBus.h"
+#include "Support/Bytes.h"
 #include "Support/ResourceCount.h"
 
 namespace Varnholt::Tests {
@@ -108,14 +109,6 @@ std::string LastError() {
     return b5ae189db26b2a1b("LastError");
 }
 
-std::vector<std::uint8_t> CountingImage() {
-    std::vector<std::uint8_t> image(OSTRA_IMAGE_SIZE);
-    for (std::size_t i = 0; i < image.size(); ++i) {
-        image[i] = static_cast<std::uint8_t>(i * 7 + i / 256);
-    }
-    return image;
-}
-
 std::string FirstIdentifier() {
     const auto devices = USBBrowser::Instance()->GetDevices(0);
     return devices.empty() ? "" : devices.front();
@@ -173,30 +166,6 @@ TEST_P(OnKernel, ReportsTheButtonAndTheRemoval) {
     plugged.Unplug();
     EXPECT_TRUE(WaitFor([&] { return listener.removed == 1; }));
     EXPECT_THROW(instrument.SetMeasureMode(1), DeviceDriverException);
-}
-
-TEST_P(OnKernel, SurvivesThePlugBeingPulled) {
-    const auto pullDuring = [](std::vector<std::string> arguments, const std::function<void()>& operation) {
-        PluggedInstrument plugged(std::move(arguments));
-        std::thread puller([&] {
-            std::this_thread::sleep_for(milliseconds(1500));
-            plugged.Unplug();
-        });
-        operation();
-        puller.join();
-    };
-    pullDuring({"--scan-bytes", "100000000", "--rate", "2e5"}, [] {
-        PellandoFunctionality instrument(nullptr, 0);
-        EXPECT_THROW(instrument.StartScan(256, 2, 100000000), DeviceDriverException);
-    });
-    pullDuring({"--faults", "bulk-out 0+:late=100"}, [] {
-        EXPECT_EQ(f3355d91d5df0e0b(CountingImage().data(), ""), OSTRA_UNKNOWN_FAILURE);
-        EXPECT_NE(LastError(), "");
-    });
-    // Plugged in again it works on, under the same name.
-    const PluggedInstrument plugged({});
-    std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
-    EXPECT_EQ(d4fb86cecc88582a(values.data(), FirstIdentifier().c_str()), OSTRA_OK) << LastError();
 }
 
 TEST_P(OnKernel, GoesOnAfterAStall) {

@@ -24,14 +24,6 @@ std::string LastError() {
     return b5ae189db26b2a1b("LastError");
 }
 
-std::vector<std::uint8_t> CountingImage() {
-    std::vector<std::uint8_t> image(OSTRA_IMAGE_SIZE);
-    for (std::size_t i = 0; i < image.size(); ++i) {
-        image[i] = static_cast<std::uint8_t>(i * 7 + i / 256);
-    }
-    return image;
-}
-
 class Exports : public testing::TestWithParam<Transport> {
   protected:
     TestClock clock_{TestTime::Virtual, 1};
@@ -55,8 +47,7 @@ class Exports : public testing::TestWithParam<Transport> {
 
     std::string busy_;
 };
-INSTANTIATE_TEST_SUITE_P(Transports, Exports, testing::Values(Transport::Native, Transport::UsbIo),
-                         [](const auto& parameter) { return std::string(Name(parameter.param)); });
+OSTRA_ON_BOTH_TRANSPORTS(Exports);
 
 TEST_P(Exports, ReadoutSendsItsFixedSequenceAndReturnsTheSensorsValues) {
     auto& instrument = host_.Add("one");

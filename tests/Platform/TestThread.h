@@ -28,6 +28,7 @@ class TestThread final {
     void Join() {
         if (handle_) {
             EXPECT_EQ(Wait(handle_.Get(), LongTimeout), WaitResult::Signalled) << "the thread does not end";
+            EXPECT_EQ(Wait(handle_.Get(), 0), WaitResult::Signalled) << "its end is for good";
             handle_.Reset();
         }
     }

@@ -13,21 +13,6 @@ namespace {
 using Threads = EachClock;
 INSTANTIATE_FOR_EACH_CLOCK(Threads);
 
-std::uint32_t SetFlagLater(void* flag) {
-    SleepMilliseconds(20);
-    *static_cast<std::atomic<bool>*>(flag) = true;
-    return 0;
-}
-
-TEST_P(Threads, AreSignalledForGoodOnceTheyEnded) {
-    std::atomic<bool> ran = false;
-    const OwnedHandle thread(StartThread(SetFlagLater, &ran));
-    EXPECT_EQ(Wait(thread.Get(), 0), WaitResult::TimedOut);
-    EXPECT_EQ(Wait(thread.Get(), LongTimeout), WaitResult::Signalled);
-    EXPECT_TRUE(ran);
-    EXPECT_EQ(Wait(thread.Get(), 0), WaitResult::Signalled);
-}
-
 TEST_P(Threads, RememberTheirPriority) {
     EXPECT_EQ(CurrentThreadPriority(), 0);
     for (const int level : {HighestThreadPriority, -1, 1, 0}) {

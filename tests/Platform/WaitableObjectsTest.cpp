@@ -186,20 +186,6 @@ TEST_P(Mutexes, AreRecursiveAndBelongToAThread) {
     }
 }
 
-TEST_P(Mutexes, AreOneForTheSameName) {
-    const OwnedHandle first(MakeMutex(NameFor("same")));
-    const OwnedHandle second(MakeMutex(NameFor("same")));
-    EXPECT_EQ(Wait(first.Get(), 0), WaitResult::Signalled);
-    TestThread([&] {
-        EXPECT_EQ(Wait(second.Get(), 0), WaitResult::TimedOut);
-        for (const char* other : {"other", "Same"}) {
-            const OwnedHandle mutex(MakeMutex(NameFor(other)));
-            EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled) << other;
-        }
-    }).Join();
-    EXPECT_TRUE(ReleaseMutex(second.Get())) << "two handles of one thread are one mutex";
-}
-
 /// To a thread that waits already, and to one that comes later.
 TEST_P(Mutexes, TellTheNextOwnerWhenTheLastOneEnded) {
     for (const std::string& name : {std::string(), NameFor("abandoned")}) {
@@ -301,23 +287,6 @@ TEST_P(SignalAndWaits, WaitForNothingWhenTheyCannotSignal) {
         EXPECT_EQ(LastError(), code);
     }
     EXPECT_EQ(Wait(event.Get(), 0), WaitResult::Signalled) << "the wait took the signal all the same";
-}
-
-/// Two threads that pass a turn to and fro would stand still if a signal came between signalling and waiting.
-TEST_P(SignalAndWaits, LoseNoSignal) {
-    const OwnedHandle first(MakeAutoResetEvent());
-    const OwnedHandle second(MakeAutoResetEvent());
-    constexpr int Turns = 500;
-    TestThread other([&] {
-        EXPECT_EQ(Wait(second.Get(), LongTimeout), WaitResult::Signalled);
-        for (int i = 0; i < Turns; ++i) {
-            ASSERT_EQ(SignalAndWait(first.Get(), second.Get(), LongTimeout), WaitResult::Signalled);
-        }
-    });
-    for (int i = 0; i < Turns; ++i) {
-        ASSERT_EQ(SignalAndWait(second.Get(), first.Get(), LongTimeout), WaitResult::Signalled);
-    }
-    SignalEvent(second.Get());
 }
 
 std::uint32_t Nothing(void*) {

@@ -23,6 +23,10 @@ Service::DeviceFacts Plugged(const char* kernelDriver = "", bool isRegistered = 
     return facts;
 }
 
+MachineFacts With(const Service::DeviceFacts& device) {
+    return {.devices = {device}};
+}
+
 /// A device that its group may use, and the user who may not.
 MachineFacts OfGroup(const char* group, const Service::GroupFacts& user) {
     auto device = Plugged();
@@ -61,25 +65,17 @@ TEST(DoctorTest, NamesTheReasonAndTheFix) {
     inKernel.devices = {Plugged()};
     MachineFacts withoutUsb = Simulated("");
     withoutUsb.hasUsb = false;
+    MachineFacts withoutLock = With(Plugged());
+    withoutLock.missingLock = noLock;
+    MachineFacts needsNoLock = withoutLock;
+    needsNoLock.needsLock = false;
     for (const Diagnosis& row : {
              Diagnosis{"nothing", {}, "p", "no USB device", "plug the instrument in", NotFound},
-             {"not registered",
-              {{Plugged("", false)}},
-              "p",
-              "usb-1p2 (1209:0001, Meter)",
-              "sudo ostra register 1209:0001",
-              NotFound},
-             {"no instrument",
-              {{other}},
-              "p",
-              "does not have the instrument's endpoints",
-              "register --remove 1209:0001",
-              NotFound},
-             {"no permission",
-              {{lockedAndHeld}},
-              "p",
-              locked,
-              "log in at this machine's own seat",
+             {"not registered", With(Plugged("", false)), "p", "usb-1p2 (1209:0001, Meter)",
+              "sudo ostra register 1209:0001", NotFound},
+             {"no instrument", With(other), "p", "does not have the instrument's endpoints",
+              "register --remove 1209:0001", NotFound},
+             {"no permission", With(lockedAndHeld), "p", locked, "log in at this machine's own seat",
               NoPermission},
              {"no member", OfGroup("plugdev", {"ann"}), "p",
               "members of the group plugdev may use it, and ann is none",
@@ -95,33 +91,18 @@ TEST(DoctorTest, NamesTheReasonAndTheFix) {
               "unplug it and plug it in again", NoPermission},
              {"no USB", {.hasUsb = false}, "p", "this machine has no USB", "usbipd attach", NotFound},
              {"no USB, simulated", withoutUsb, "gn", "this machine has no USB", "/dev/bus/usb", {}, 1},
-             {"no lock",
-              {.devices = {Plugged()}, .missingLock = noLock},
-              "gp",
-              "no lock there",
-              "make room",
-              FailureKind::NoLock,
-              1},
+             {"no lock", withoutLock, "gp", "no lock there", "make room", FailureKind::NoLock, 1},
              {"no lock needed",
-              {.devices = {Plugged()}, .missingLock = noLock, .needsLock = false},
+              needsNoLock,
               "gn",
               "no lock there; the transport native needs it",
               "make room",
               {},
               1},
-             {"held",
-              {{held}},
-              "p",
-              "is in use by python3 (process 42)",
-              "end that program",
+             {"held", With(held), "p", "is in use by python3 (process 42)", "end that program",
               FailureKind::InUse},
-             {"silent",
-              {{Plugged("silent")}},
-              "np",
-              "does not answer: no answer in time",
-              "its firmware does not run",
-              FailureKind::Timeout,
-              1},
+             {"silent", With(Plugged("silent")), "np", "does not answer: no answer in time",
+              "its firmware does not run", FailureKind::Timeout, 1},
              {"simulated, in use", Simulated("ostra (process 8)"), "p", "is in use by ostra (process 8)",
               "end that program", FailureKind::InUse},
              {"simulated, stopped", Simulated("", true, false), "p", "simulated-1 does not answer",
@@ -129,9 +110,9 @@ TEST(DoctorTest, NamesTheReasonAndTheFix) {
              {"simulated, another user's", Simulated("", false), "np", "no USB device", "ostra-simulator",
               NotFound},
              {"simulated, plugged into the kernel", inKernel, "gn", "is plugged into the kernel", "", {}, 1},
-             {"good", {{Plugged()}}, "g", answers, "", {}, 1},
-             {"a kernel driver", {{Plugged("cdc_acm")}}, "ng", answers, "", {}, 1},
-             {"a program drives it", {{Plugged("usbfs")}}, "g", answers, "", {}, 1},
+             {"good", With(Plugged()), "g", answers, "", {}, 1},
+             {"a kernel driver", With(Plugged("cdc_acm")), "ng", answers, "", {}, 1},
+             {"a program drives it", With(Plugged("usbfs")), "g", answers, "", {}, 1},
              {"simulated", Simulated(""), "g", answers, "", {}, 1},
              {"one held, one good", {{held, Plugged()}}, "pg", answers, "", {}, 1},
          }) {

@@ -39,12 +39,5 @@ TEST(SensorModelTest, MoreLightOrTimeGivesMoreUntilItSaturates) {
     EXPECT_LT(normal[0], 200) << "a covered pixel";
 }
 
-TEST(SensorModelTest, NoiseIsSeeded) {
-    const SensorModel dark(1, 0.0, 1.0);
-    EXPECT_EQ(Readings(dark, {20000}, 3, 4), Readings(dark, {20000}, 3, 4));
-    EXPECT_NE(Readings(dark, {20000}, 3, 4), Readings(dark, {20000}, 4, 4));
-    EXPECT_NE(Readings(dark, {20000}, 3, 4), Readings(SensorModel(2, 0.0, 1.0), {20000}, 3, 4));
-}
-
 }  // namespace
 }  // namespace Varnholt::Simulator

@@ -6,13 +6,13 @@
 #include <array>
 #include <cstdlib>
 #include <fstream>
-#include <iterator>
 #include <stdexcept>
 #include <string>
 #include <vector>
 
 #include "ostra.h"
 #include "SimulatedSetup.h"
+#include "Support/Bytes.h"
 #include "Support/TestFolder.h"
 
 namespace Varnholt::Simulator {
@@ -62,13 +62,9 @@ TEST(SimulatedLibrary, ServesAHostFromTheSetupInTheEnvironment) {
     EXPECT_EQ("", ReadoutOf(Way + "other", none)) << "no text: there is none";
     EXPECT_EQ(Values{}, none);
 
-    std::vector<std::uint8_t> image(OSTRA_IMAGE_SIZE);
-    for (std::size_t i = 0; i < image.size(); ++i) {
-        image[i] = static_cast<std::uint8_t>(i * 7 + i / 256);
-    }
+    const Tests::Bytes image = Tests::CountingImage();
     ASSERT_EQ(OSTRA_OK, f3355d91d5df0e0b(image.data(), (Way + "lamp").c_str()));
-    std::ifstream kept(memory, std::ios::binary);
-    EXPECT_EQ(image, std::vector<std::uint8_t>(std::istreambuf_iterator<char>(kept), {}));
+    EXPECT_EQ(image, Tests::ReadFile(memory));
     EXPECT_EQ(OSTRA_UNKNOWN_FAILURE, f3355d91d5df0e0b(image.data(), (Way + "mute").c_str()));
 }
 

@@ -17,6 +17,15 @@ inline Bytes Counting(std::size_t count, unsigned first = 0) {
     return bytes;
 }
 
+/// An image whose pieces differ.
+inline Bytes CountingImage(unsigned first = 0) {
+    Bytes image(8192);
+    for (std::size_t i = 0; i < image.size(); ++i) {
+        image[i] = static_cast<std::uint8_t>(i * 7 + i / 256 + first);
+    }
+    return image;
+}
+
 /// "1F 00 A2"
 inline std::string Hex(const std::uint8_t* bytes, std::size_t count) {
     std::string text;

@@ -138,13 +138,7 @@ TEST_P(AllocationFailure, EndsInAResultCodeAndLeavesNothing) {
     EXPECT_EQ(tested.call() == OSTRA_OK, tested.succeeds);
 }
 
-INSTANTIATE_TEST_SUITE_P(All, AllocationFailure,
-                         testing::Combine(testing::Values(Transport::Native, Transport::UsbIo),
-                                          testing::Range<std::size_t>(0, Cases.size())),
-                         [](const auto& parameter) {
-                             return std::string(Name(std::get<0>(parameter.param))) + "_" +
-                                    Cases[std::get<1>(parameter.param)].name;
-                         });
+OSTRA_SWEEP_BOTH_TRANSPORTS(AllocationFailure, Cases);
 
 TEST(AllocationFailureOfACondition, SaysThatItsStateCannotBeMade) {
     using Utilities::Multithreading::Condition;

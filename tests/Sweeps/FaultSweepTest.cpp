@@ -18,7 +18,6 @@
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
-#include "DeviceDriver/Ostra/LowLevel/PellandoRAM.h"
 #include "FaultInjector.h"
 #include "FaultPlan.h"
 #include "FreshEeprom.h"
@@ -56,8 +55,6 @@ struct Operation {
     /// Opens the instrument, does its work, closes it.
     std::function<Outcome()> run;
     std::uint64_t scanBytes = Protocol::ReadoutBytes;
-    /// As an open-ended scan does, so that it cannot tell a fault from its end.
-    bool endsWithShortTransfer = false;
 
     /// The EEPROM before each run, and what must hold of it after one with `fault` at a transfer of
     /// `endpoint`. Empty: it does not matter.
@@ -67,7 +64,6 @@ struct Operation {
 
 constexpr std::uint32_t ScanRecord = 1000;
 constexpr std::uint32_t ScanTotal = 100000;
-constexpr std::uint64_t OpenScanTotal = 155'000;
 /// Longest time-outs on the road: a transfer (15 s for a piece of the EEPROM), then a listener that is waited
 /// for.
 constexpr std::uint64_t TimeLimit = 40'000;  // ms
@@ -101,16 +97,13 @@ Outcome ImageWrite() {
     return LastErrorUnless(code == OSTRA_OK);
 }
 
-/// `total` bytes; 0: until the instrument stops.
-std::function<Outcome()> Scan(std::uint32_t total) {
-    return Caught([total] {
-        PellandoFunctionality instrument(nullptr, 0);
-        instrument.StartScan(ScanRecord, 1, total);
-        Bytes record(ScanRecord);
-        for (std::uint32_t size = ScanRecord; size > 0;) {
-            instrument.GetScanData(record.data(), size);
-        }
-    });
+void Scan() {
+    PellandoFunctionality instrument(nullptr, 0);
+    instrument.StartScan(ScanRecord, 1, ScanTotal);
+    Bytes record(ScanRecord);
+    for (std::uint32_t size = ScanRecord; size > 0;) {
+        instrument.GetScanData(record.data(), size);
+    }
 }
 
 struct Area {
@@ -175,14 +168,6 @@ void CheckEeprom(const Bytes& before, const std::vector<Area>& written, const By
     }
 }
 
-void StoreParameters() {
-    PellandoRAM ram(Commands(new PellandoFunctionality(nullptr, 0)));
-    Properties set("PhysicalConditions");
-    ram.Load(set);
-    set.SetProperty(2009, Property(0.005F));
-    ram.Store(set);
-}
-
 Operation Checked(const char* name, std::function<Outcome()> run, std::vector<Area> written) {
     Operation operation{name, std::move(run)};
     operation.eeprom = UsedImage();
@@ -211,8 +196,7 @@ Operation OfModel(const char* name, std::function<void(PellandoEEPROM&)> work,
 /// The readout and the image go through most of the commands, the memory model through the others.
 std::vector<Operation> Operations() {
     return {
-        {"FixedScan", Scan(ScanTotal), ScanTotal},
-        {"OpenScan", Scan(0), OpenScanTotal, true},
+        {"Scan", Caught(&Scan), ScanTotal},
         {"ExportedReadout", &Readout},
         {"ExportedImageWrite", &ImageWrite},
         OfModel("ModelAndItsEnd", [](PellandoEEPROM&) {}),
@@ -240,7 +224,6 @@ std::vector<Operation> Operations() {
                 {{Map::BinaryFirst, Map::BinaryFirstSize},
                  {Map::BinarySecond, Map::BinarySecondSize},
                  {Map::RawWords + 3 * Map::RawWordSize, Map::RawWordSize}}),
-        Checked("RamStore", Caught(&StoreParameters), {}),
     };
 }
 
@@ -262,8 +245,7 @@ bool IsDocumented(Transport transport, const std::string& text) {
 }
 
 /// Whether an operation can end well although this fault hit this transfer.
-bool MayGoUnnoticed(Transport transport, const Fault& fault, const RecordedTransfer& undisturbed,
-                    bool openScan) {
+bool MayGoUnnoticed(Transport transport, const Fault& fault, const RecordedTransfer& undisturbed) {
     const bool control = undisturbed.endpoint == 0;
     if (undisturbed.endpoint == Protocol::InterruptInEndpoint ||
         undisturbed.status == TransferStatus::Cancelled) {
@@ -281,7 +263,7 @@ bool MayGoUnnoticed(Transport transport, const Fault& fault, const RecordedTrans
             return true;
         case FaultKind::Short:
         case FaultKind::Empty:
-            return control || transport == Transport::UsbIo || undisturbed.length == 0 || openScan;
+            return control || transport == Transport::UsbIo || undisturbed.length == 0;
         case FaultKind::Long:
             return undisturbed.length == 0;
         default:
@@ -333,8 +315,7 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
         if (outcome) {
             EXPECT_TRUE(IsDocumented(transport_, *outcome)) << *outcome;
         } else if (script->Hits() > 0 && isTold) {
-            EXPECT_TRUE(MayGoUnnoticed(transport_, fault, undisturbed, operation_.endsWithShortTransfer))
-                << "passed all the same";
+            EXPECT_TRUE(MayGoUnnoticed(transport_, fault, undisturbed)) << "passed all the same";
         }
         EXPECT_EQ(instrument.PendingTransfers(), 0U);
         EXPECT_FALSE(instrument.Claimed());
@@ -357,19 +338,9 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
 
 /// Faults that have a number, with one that every transfer notices.
 std::optional<std::uint32_t> ArgumentOf(FaultKind kind) {
-    switch (kind) {
-        case FaultKind::Late:
-            return 20;
-        case FaultKind::Flip:
-            return 0;
-        default:
-            return std::nullopt;
-    }
-}
-
-/// An instrument that never stops streaming makes an open-ended scan last for ever, as it should.
-bool NeverEnds(const Operation& operation, const Fault& fault) {
-    return operation.endsWithShortTransfer && fault.fromThenOn && fault.kind == FaultKind::Stale;
+    return kind == FaultKind::Late   ? std::optional(20U)
+           : kind == FaultKind::Flip ? std::optional(0U)
+                                     : std::nullopt;
 }
 
 /// The same fault, counted among the transfers of its endpoint: where the system decides which thread is
@@ -384,20 +355,14 @@ Fault CountedByEndpoint(Fault fault, const std::vector<RecordedTransfer>& undist
 }
 
 /// Every fault at every transfer of an operation that makes `count` of them.
-std::vector<Fault> FaultsOver(const Operation& operation, std::size_t count) {
+std::vector<Fault> FaultsOver(std::size_t count) {
     std::vector<Fault> faults;
     // The pieces of a whole image are alike: the first and last ones stand for all, and samples between.
     for (std::size_t index = 0; index < count; index += (index > 12 && index + 12 < count) ? 11 : 1) {
         for (const auto& name : Simulator::AllFaults()) {
             for (const bool fromThenOn : {false, true}) {
-                Fault fault;
-                fault.index = static_cast<std::uint32_t>(index);
-                fault.fromThenOn = fromThenOn;
-                fault.kind = name.kind;
-                fault.argument = ArgumentOf(name.kind);
-                if (!NeverEnds(operation, fault)) {
-                    faults.push_back(fault);
-                }
+                faults.push_back({std::nullopt, static_cast<std::uint32_t>(index), fromThenOn, name.kind,
+                                  ArgumentOf(name.kind)});
             }
         }
     }
@@ -406,7 +371,7 @@ std::vector<Fault> FaultsOver(const Operation& operation, std::size_t count) {
 
 TEST_P(FaultSweep, EveryFaultAtEveryTransfer) {
     const std::vector<RecordedTransfer> undisturbed = Undisturbed();
-    const std::vector<Fault> faults = FaultsOver(operation_, undisturbed.size());
+    const std::vector<Fault> faults = FaultsOver(undisturbed.size());
     EXPECT_GT(faults.size(), 50U);
     // In real time there is time for some of them only: steps that go round through all spread what is tried.
     const bool inRealTime = !TestClock(TestTime::Virtual).IsVirtual();
@@ -428,13 +393,7 @@ TEST_P(FaultSweep, EveryFaultAtEveryTransfer) {
     std::printf("%zu transfers, %zu of %zu cases\n", undisturbed.size(), cases, faults.size());
 }
 
-INSTANTIATE_TEST_SUITE_P(All, FaultSweep,
-                         testing::Combine(testing::Values(Transport::Native, Transport::UsbIo),
-                                          testing::Range<std::size_t>(0, Operations().size())),
-                         [](const auto& parameter) {
-                             return std::string(Name(std::get<0>(parameter.param))) + "_" +
-                                    Operations()[std::get<1>(parameter.param)].name;
-                         });
+OSTRA_SWEEP_BOTH_TRANSPORTS(FaultSweep, Operations());
 
 }  // namespace
 }  // namespace Varnholt::Tests

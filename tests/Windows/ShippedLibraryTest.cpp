@@ -22,20 +22,13 @@
 #include "ShippedLibrary.h"
 #include "SimulatedBus.h"
 #include "StandInDriver.h"
+#include "Support/Bytes.h"
 #include "TransferRecorder.h"
 
 namespace Varnholt::Tests {
 namespace {
 
 using testing::HasSubstr;
-
-std::vector<std::uint8_t> MakeImage(std::uint8_t seed) {
-    std::vector<std::uint8_t> image(OSTRA_IMAGE_SIZE);
-    for (std::size_t i = 0; i < image.size(); ++i) {
-        image[i] = static_cast<std::uint8_t>(i * 7 + i / 256 + seed);
-    }
-    return image;
-}
 
 /// The number of open handles of this process is the same at the end of the object's life as at its
 /// beginning.
@@ -112,12 +105,6 @@ std::string TranscriptInProcess(std::uint64_t seed, Operation operation) {
     return recorder.Text(Simulator::TestControls::TranscriptBytes);
 }
 
-Values ReadoutInProcess(std::uint64_t seed) {
-    Values values{};
-    TranscriptInProcess(seed, [&] { Interface::TakeReadout(values, ""); });
-    return values;
-}
-
 TEST_F(Shipped, ReadoutIsTheSameAsInProcess) {
     const std::string path = driver->PlugIn();
     Instrument(path).TakeTranscript();
@@ -136,27 +123,12 @@ TEST_F(Shipped, ReadoutIsTheSameAsInProcess) {
 TEST_F(Shipped, ImageIsWritten) {
     const std::string path = driver->PlugIn();
     Instrument(path).TakeTranscript();
-    const std::vector<std::uint8_t> image = MakeImage(3);
+    const std::vector<std::uint8_t> image = CountingImage(3);
     EXPECT_EQ(WriteImage(image, path), OSTRA_OK) << library->LastError();
     EXPECT_EQ(Instrument(path).Eeprom(), image);
     EXPECT_EQ(Instrument(path).TakeTranscript(), TranscriptInProcess(driver->SeedOf(path), [&] {
                   Interface::WriteImage(std::span<const std::uint8_t, OSTRA_IMAGE_SIZE>(image), "");
               }));
-}
-
-TEST_F(Shipped, NamedInstrumentIsTaken) {
-    const std::string first = driver->PlugIn();
-    const std::string second = driver->PlugIn();
-    const std::vector<std::uint8_t> before = Instrument(first).Eeprom();
-    EXPECT_EQ(WriteImage(MakeImage(4), second), OSTRA_OK) << library->LastError();
-    EXPECT_EQ(Instrument(second).Eeprom(), MakeImage(4));
-    EXPECT_EQ(Instrument(first).Eeprom(), before);
-
-    EXPECT_EQ(TakeReadout(second), OSTRA_OK);
-    EXPECT_THAT(library->values, testing::ElementsAreArray(ReadoutInProcess(driver->SeedOf(second))));
-
-    EXPECT_EQ(TakeReadout(second + "x"), OSTRA_FAILURE);
-    EXPECT_EQ(library->LastError(), "");
 }
 
 /// The other process takes the instrument that is listed first: on the way to another one it would try that
@@ -202,41 +174,6 @@ TEST_F(Shipped, InstrumentIsPulledOutUnderAReadout) {
     EXPECT_EQ(TakeReadout(again), OSTRA_OK) << library->LastError();
 }
 
-TEST_F(Shipped, UnansweredReadoutEndsInTime) {
-    const std::string path = driver->PlugIn();
-    const bool isNative = !StandInDriver::HostIs64Bit();
-    const struct {
-        const char* faults;
-        DWORD milliseconds;
-        const char* text;
-    } cases[] = {{"bulk-in 0:silent", 7000, isNative ? "read data failed (Win32 Error (996)" : "0xE000100C"},
-                 {"control 1:silent", isNative ? 2000U : 5000U,
-                  isNative ? "Device IO control failed  (Win32 Error (997)" : "0xE000100C"}};
-    for (const auto& row : cases) {
-        SCOPED_TRACE(row.faults);
-        Instrument(path).SetFaults(row.faults);
-        const DWORD start = GetTickCount();
-        EXPECT_EQ(TakeReadout(path), OSTRA_FAILURE);
-        const DWORD elapsed = GetTickCount() - start;
-        EXPECT_THAT(library->LastError(), HasSubstr(row.text));
-        EXPECT_GE(elapsed, row.milliseconds - 100);
-        EXPECT_LT(elapsed, row.milliseconds + 2500);
-        EXPECT_EQ(Instrument(path).Counts().pendingTransfers, 0U);
-    }
-    Instrument(path).SetFaults("");
-    EXPECT_EQ(TakeReadout(path), OSTRA_OK) << library->LastError();
-}
-
-TEST_F(Shipped, InstrumentInUseElsewhereIsPassedOver) {
-    const std::string used = driver->PlugIn();
-    const std::string free = driver->PlugIn();
-    Instrument(used).UseElsewhere();
-    EXPECT_EQ(TakeReadout(used), OSTRA_FAILURE);
-    EXPECT_EQ(library->LastError(), "");
-    EXPECT_EQ(TakeReadout(""), OSTRA_OK) << library->LastError();
-    EXPECT_EQ(Instrument(free).Counts().measurements, 1U);
-}
-
 TEST_F(Shipped, AnotherProcessHoldsTheInstrument) {
     if (StandInDriver::HostIs64Bit()) {
         GTEST_SKIP() << "the named lock belongs to the instrument's own driver";
@@ -253,20 +190,6 @@ TEST_F(Shipped, AnotherProcessHoldsTheInstrument) {
         EXPECT_EQ(TakeReadout(path), OSTRA_OK) << library->LastError();
         EXPECT_GE(GetTickCount() - start, ChildProcess::HoldMilliseconds + 900);
         EXPECT_EQ(holder.Wait(), 0U);
-    }
-}
-
-TEST_F(Shipped, OnlyAUsbIoDriverOfItsVersionIsUsed) {
-    if (!StandInDriver::HostIs64Bit()) {
-        GTEST_SKIP() << "the instrument's own driver tells no version";
-    }
-    const std::string path = driver->PlugIn();
-    const std::pair<WORD, std::int32_t> versions[] = {
-        {0x022F, OSTRA_FAILURE}, {0x0300, OSTRA_FAILURE}, {0x0230, OSTRA_OK}, {0x02FF, OSTRA_OK}};
-    for (const auto& [version, expected] : versions) {
-        Instrument(path).SetInterfaceVersion(version);
-        EXPECT_EQ(TakeReadout(path), expected) << std::hex << version;
-        EXPECT_EQ(library->LastError(), "") << std::hex << version;
     }
 }
 
@@ -303,8 +226,10 @@ TEST_F(Shipped, ProgramsDoTheWholeJob) {
         RunProgram(Quoted(example) + ' ' + Quoted(ShippedLibrary::path) + " \"\" C:\\image");
     EXPECT_EQ(exampleCode, 0U) << values;
     std::istringstream stream(values);
+    Values inProcess{};
+    TranscriptInProcess(driver->SeedOf(path), [&] { Interface::TakeReadout(inProcess, ""); });
     EXPECT_THAT(std::vector<std::int32_t>(std::istream_iterator<std::int32_t>(stream), {}),
-                testing::ElementsAreArray(ReadoutInProcess(driver->SeedOf(path))));
+                testing::ElementsAreArray(inProcess));
     const std::string image = Content("C:\\image");
     EXPECT_EQ(Instrument(path).Eeprom(), std::vector<BYTE>(image.begin(), image.end()));
 }

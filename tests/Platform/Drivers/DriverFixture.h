@@ -10,6 +10,7 @@
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFileSystem.h"
 #include "Platform/WaitableObjects.h"
+#include "Protocol/ByteOrder.h"
 #include "Protocol/NativeDriver.h"
 #include "Protocol/UsbIoDriver.h"
 #include "Support/HookedUsb.h"
@@ -36,49 +37,34 @@ struct Request {
     bool TakeSignal() { return Platform::Wait(event.Get(), 0) == Platform::WaitResult::Signalled; }
 };
 
-inline std::uint8_t ByteOf(std::uint32_t value, unsigned number) {
-    return static_cast<std::uint8_t>(value >> 8 * number);
-}
-
 /// The blocks of both drivers as hosts lay them out; reserved and padding bytes of the first do not matter.
 inline Bytes NativeBlock(std::uint8_t request, std::uint8_t direction, std::uint16_t value = 0,
                          std::uint16_t index = 0, std::uint8_t type = 2, std::uint8_t recipient = 0) {
-    return {direction,        type,
-            recipient,        0xEE,
-            request,          0xEE,
-            ByteOf(value, 0), ByteOf(value, 1),
-            ByteOf(index, 0), ByteOf(index, 1)};
+    Bytes block{direction, type, recipient, 0xEE, request, 0xEE, 0, 0, 0, 0};
+    Protocol::StoreLittle16(&block[6], value);
+    Protocol::StoreLittle16(&block[8], index);
+    return block;
 }
 
 inline Bytes ConfigurationBlock(std::uint8_t configuration = 0, std::uint8_t entries = 1,
                                 std::uint8_t interface = 0, std::uint8_t alternate = 0,
                                 std::uint32_t most = 65536) {
     Bytes block{configuration, 0, entries, 0, interface, 0, alternate, 0};
-    block.insert(block.end(), {ByteOf(most, 0), ByteOf(most, 1), ByteOf(most, 2), ByteOf(most, 3)});
     block.resize(260);
+    Protocol::StoreLittle32(&block[8], most);
     return block;
 }
 
 inline Bytes RequestBlock(std::uint8_t request, std::uint16_t value = 0, std::uint16_t index = 0,
                           std::uint8_t type = 2, std::uint8_t recipient = 0, std::uint8_t reserved = 0) {
-    return {0,
-            0,
-            0,
-            0,
-            type,
-            0,
-            0,
-            0,
-            recipient,
-            0,
-            0,
-            0,
-            reserved,
-            request,
-            ByteOf(value, 0),
-            ByteOf(value, 1),
-            ByteOf(index, 0),
-            ByteOf(index, 1)};
+    Bytes block(18);
+    block[4] = type;
+    block[8] = recipient;
+    block[12] = reserved;
+    block[13] = request;
+    Protocol::StoreLittle16(&block[14], value);
+    Protocol::StoreLittle16(&block[16], index);
+    return block;
 }
 
 /// Both drivers over one device, "port1".

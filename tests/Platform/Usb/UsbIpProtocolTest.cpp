@@ -1,7 +1,6 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <random>
 #include <string>
 #include <utility>
 #include <vector>
@@ -83,15 +82,6 @@ TEST(UsbIpProtocolTest, RefusesPacketsThatCannotBeServed) {
     std::fill_n(noPackets.begin() + 0x20, 4, std::uint8_t{0xFF});
     EXPECT_TRUE(UsbIp::DecodePacket(noPackets)) << "the other way to write no isochronous packets";
     EXPECT_FALSE(UsbIp::DecodePacket(UsbIp::Encode(UsbIp::SubmitReply{1, 0, UsbIp::MaximumPayload + 1})));
-    std::mt19937 random(1);
-    for (int round = 0; round < 20000; ++round) {
-        UsbIp::PacketBytes bytes{};
-        std::ranges::generate(bytes, [&random] { return random() % 4 == 0 ? random() & 0xFFU : 0; });
-        bytes[3] = static_cast<std::uint8_t>(random() % 6);
-        if (const auto packet = UsbIp::DecodePacket(bytes)) {
-            EXPECT_EQ(packet, UsbIp::DecodePacket(UsbIp::Encode(*packet)));
-        }
-    }
 }
 
 /// The kernel's own numbers: EPIPE, EPROTO, EOVERFLOW, ECONNRESET, ENODEV; and ENOENT, ESHUTDOWN and any

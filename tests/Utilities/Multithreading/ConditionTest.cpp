@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "Platform/CallFilter.h"
+#include "Platform/UniqueName.h"
 #include "Support/DriverTest.h"
 #include "Utilities/Exceptions/Exceptions.h"
 #include "Utilities/Multithreading/Condition.h"
@@ -23,13 +24,6 @@ using Platform::SleepMilliseconds;
 using Tests::BackgroundThread;
 using Tests::ExpectThrow;
 using Tests::WaitUntil;
-
-/// Of this process and test alone.
-std::string UniqueName() {
-    static int count = 0;
-    return "ostra-test-" + std::to_string(std::chrono::steady_clock::now().time_since_epoch().count()) + "-" +
-           std::to_string(++count);
-}
 
 void Elsewhere(std::function<void()> work) {
     BackgroundThread(std::move(work)).Join();
@@ -60,14 +54,14 @@ class Locks : public testing::Test {
     }
 
     const Tests::TestClock clock_{Tests::TestTime::RealForThreadSanitizer};
-    Mutex mutex_{UniqueName()};
+    Mutex mutex_{Platform::UniqueName("lock")};
 };
 
 TEST_F(Locks, AMutexOfOneNameIsRecursiveAndOneLock) {
-    const std::string name = UniqueName();
+    const std::string name = Platform::UniqueName("recursive");
     auto original = std::make_unique<SynchronizationObject>(CreateMutexImpl(name));
     SynchronizationObject copy(*original);
-    Mutex sameName(name);
+    Mutex sameName(name), otherCase("O" + name.substr(1));
     original->Lock();
     copy.Lock();
     for (const bool isFree : {false, true}) {
@@ -75,7 +69,7 @@ TEST_F(Locks, AMutexOfOneNameIsRecursiveAndOneLock) {
         copy.Unlock();
         EXPECT_EQ(IsFree(copy), isFree) << "as many unlocks as locks";
         EXPECT_EQ(IsFree(sameName), isFree);
-        EXPECT_TRUE(IsFree(mutex_));
+        EXPECT_TRUE(IsFree(otherCase));
     }
 }
 
@@ -111,7 +105,7 @@ TEST_F(Locks, TimeoutIsALimitAndNegativeIsNone) {
 }
 
 TEST_F(Locks, ASemaphoreStartsAtOneAndEachUnlockGivesOneBackUpToTheMaximum) {
-    const std::string name = UniqueName();
+    const std::string name = Platform::UniqueName("semaphore");
     SynchronizationObject semaphore(CreateSemaphoreImpl(name, 3)), sameName(CreateSemaphoreImpl(name, 3));
     for (const int unlocks : {1, 2, 5}) {
         int taken = 0;

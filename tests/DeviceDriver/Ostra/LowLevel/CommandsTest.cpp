@@ -99,8 +99,7 @@ class Commands : public DriverTest, public testing::WithParamInterface<Transport
     Pointer transport_;
     std::optional<PellandoFunctionality> instrument_;
 };
-INSTANTIATE_TEST_SUITE_P(Transports, Commands, testing::Values(Transport::Native, Transport::UsbIo),
-                         [](const auto& parameter) { return std::string(Name(parameter.param)); });
+OSTRA_ON_BOTH_TRANSPORTS(Commands);
 
 // What commands hand out.
 const Bytes None;

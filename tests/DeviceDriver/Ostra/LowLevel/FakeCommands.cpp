@@ -12,12 +12,12 @@ using Generic::Utilities::IOException;
 using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Tools::SmartPointer;
 
-void PrintTo(const Command& command, std::ostream* stream) {
-    *stream << command.name << "(" << command.address << ", " << command.size << ")";
-}
-
-std::vector<Command> FakeInstrument::TakeCommands() {
-    return std::exchange(commands, {});
+std::string FakeInstrument::TakeCommands() {
+    std::string text;
+    for (const std::string& command : std::exchange(commands, {})) {
+        text += (text.empty() ? "" : " ") + command;
+    }
+    return text;
 }
 
 namespace {
@@ -48,7 +48,7 @@ class FakeCommands final : public PellandoFunctionalityByte {
         p5 = instrument_.p5;
     }
     void SetMeasureMode(std::uint8_t mode) override {
-        Receive("SetMeasureMode", mode);
+        Receive("SetMeasureMode");
         instrument_.mode = mode;
     }
     void GetMeasureMode(std::uint8_t& m1, std::uint8_t& m2, std::uint8_t& m3, std::uint8_t& m4,
@@ -62,11 +62,11 @@ class FakeCommands final : public PellandoFunctionalityByte {
     }
     void WriteEEPROM(const Bytes4& address, const Bytes2& length, const std::uint8_t* data,
                      std::uint32_t count) override {
-        std::copy_n(data, count, Place("WriteEEPROM", address, length, count));
+        std::copy_n(data, count, Place("write ", address, length, count));
     }
     void ReadEEPROM(const Bytes4& address, const Bytes2& length, std::uint8_t* data,
                     std::uint32_t count) override {
-        std::copy_n(Place("ReadEEPROM", address, length, count), count, data);
+        std::copy_n(Place("read ", address, length, count), count, data);
     }
     void GetMISC(std::uint8_t& m1, Bytes2& m2, std::uint8_t& m3, Bytes2& m4, Bytes2& m5) override {
         Receive("GetMISC");
@@ -76,7 +76,7 @@ class FakeCommands final : public PellandoFunctionalityByte {
         Protocol::StoreBig16(m4.data(), instrument_.misc4);
         Protocol::StoreBig16(m5.data(), instrument_.misc5);
     }
-    void Reset(const Bytes2& code) override { Receive("Reset", Number(code)); }
+    void Reset(const Bytes2&) override { Receive("Reset"); }
 
     // What nobody asks it for.
     void WriteCPLD(const Bytes2&, const Bytes2&, const Bytes2&) override {}
@@ -91,8 +91,8 @@ class FakeCommands final : public PellandoFunctionalityByte {
     void GetDeviceIdentifier(std::string&) override {}
 
   private:
-    void Receive(const char* name, std::uint32_t address = 0, std::uint32_t size = 0) {
-        instrument_.commands.push_back({name, address, size});
+    void Receive(const std::string& command) {
+        instrument_.commands.push_back(command);
         if (instrument_.commands.size() - 1 == instrument_.failingCommand) {
             throw IOException("the fake fails", Here());
         }
@@ -103,7 +103,7 @@ class FakeCommands final : public PellandoFunctionalityByte {
             count != Number(length)) {
             throw std::logic_error("EEPROM transfer outside the EEPROM");
         }
-        Receive(name, start, count);
+        Receive(name + std::to_string(start) + "+" + std::to_string(count));
         return instrument_.eeprom.data() + start;
     }
 

@@ -3,7 +3,6 @@
 #include <array>
 #include <cstdint>
 #include <functional>
-#include <ostream>
 #include <string>
 #include <vector>
 
@@ -13,19 +12,10 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 using Bytes = std::vector<std::uint8_t>;
 
-/// One command as it reached the fake; the number of a mode or a reset stands in the place of an address.
-struct Command {
-    std::string name;
-    std::uint32_t address = 0;
-    std::uint32_t size = 0;
-    bool operator==(const Command&) const = default;
-};
-void PrintTo(const Command& command, std::ostream* stream);
-
 /// What the fake instrument keeps, and how it misbehaves; owned by the test.
 struct FakeInstrument {
     Bytes eeprom{};
-    std::vector<Command> commands{};
+    std::vector<std::string> commands{};  ///< "GetMISC", "write 256+40"
 
     std::uint16_t p1 = 0, p2 = 0, p3 = 0;
     std::uint8_t p4 = 0, p5 = 0;
@@ -38,7 +28,8 @@ struct FakeInstrument {
     /// The command with this index fails with `IOException`.
     std::size_t failingCommand = ~std::size_t{0};
 
-    std::vector<Command> TakeCommands();
+    /// With blanks between them.
+    std::string TakeCommands();
 };
 
 /// A command set whose transport is the fake; its opening reset is not among the commands.

@@ -55,8 +55,7 @@ class ReceivedScan : public testing::TestWithParam<Transport> {
 
     TestClock clock_{TestTime::Virtual};
 };
-INSTANTIATE_TEST_SUITE_P(Transports, ReceivedScan, testing::Values(Transport::Native, Transport::UsbIo),
-                         [](const auto& parameter) { return std::string(Name(parameter.param)); });
+OSTRA_ON_BOTH_TRANSPORTS(ReceivedScan);
 
 TEST_P(ReceivedScan, BringsWhatWouldBeCollectedAndWhatCameBeforeAFailure) {
     constexpr std::uint32_t total = Record * Records;

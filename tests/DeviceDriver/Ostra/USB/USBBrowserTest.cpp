@@ -67,8 +67,7 @@ TEST_P(Browser, ListsAfreshUpTo127Instruments) {
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(Transports, Browser, testing::Values(Transport::Native, Transport::UsbIo),
-                         [](const auto& parameter) { return std::string(Name(parameter.param)); });
+OSTRA_ON_BOTH_TRANSPORTS(Browser);
 
 }  // namespace
 }  // namespace Varnholt::Tests
