@@ -1,6 +1,7 @@
 #include "TransferRecorder.h"
 
 #include <algorithm>
+#include <array>
 #include <map>
 #include <utility>
 
@@ -29,21 +30,8 @@ std::string EndpointText(const RecordedTransfer& transfer) {
 }  // namespace
 
 std::string ToText(TransferStatus status) {
-    switch (status) {
-        case TransferStatus::Completed:
-            return "completed";
-        case TransferStatus::Stalled:
-            return "stalled";
-        case TransferStatus::IoError:
-            return "I/O error";
-        case TransferStatus::Overflow:
-            return "overflow";
-        case TransferStatus::Cancelled:
-            return "cancelled";
-        case TransferStatus::DeviceGone:
-            return "device gone";
-    }
-    return "?";
+    constexpr std::array texts{"completed", "stalled", "I/O error", "overflow", "cancelled", "device gone"};
+    return texts.at(static_cast<std::size_t>(status));
 }
 
 std::string RecordedTransfer::Text(std::size_t most) const {

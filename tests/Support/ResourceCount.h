@@ -5,12 +5,12 @@
 
 namespace Varnholt::TestSupport {
 
-/// What this process has taken from the system. Counts that lag behind (a thread that has been joined may
-/// still be listed for a moment) are the reason for `Settles`.
+/// What this process has taken from the system, on Linux. Counts that lag behind (a thread that has been
+/// joined may still be listed for a moment) are the reason for `Settles`.
 struct ResourceCount {
     std::size_t threads = 0;
-    std::size_t files = 0;  ///< descriptors; on Windows all handles
-    std::size_t maps = 0;   ///< mapped files; 0 on Windows
+    std::size_t files = 0;  ///< descriptors
+    std::size_t maps = 0;   ///< mapped files
 
     bool operator==(const ResourceCount&) const = default;
 

@@ -1,53 +1,42 @@
 #include "Platform/Linux/ErrnoCodes.h"
 
+#include <algorithm>
+#include <array>
 #include <cerrno>
 
 namespace Varnholt::Platform::Linux {
+namespace {
+
+struct Meaning {
+    ErrorCode code;
+    std::array<int, 5> numbers;
+};
+
+/// `ELOOP` is a symbolic link where none may be.
+constexpr Meaning Meanings[] = {
+    {Errors::Success, {0}},
+    {Errors::FileNotFound, {ENOENT}},
+    {Errors::PathNotFound, {ENOTDIR}},
+    {Errors::AccessDenied, {EACCES, EPERM, EROFS, ELOOP, EISDIR}},
+    {Errors::InvalidHandle, {EBADF}},
+    {Errors::NotEnoughMemory, {ENOMEM}},
+    {Errors::InvalidParameter, {EINVAL, ENAMETOOLONG}},
+    {Errors::Busy, {EBUSY, EAGAIN}},
+    {Errors::CallNotImplemented, {ENOSYS}},
+    {Errors::NotSupported, {EOPNOTSUPP}},
+    {Errors::SemaphoreTimeout, {ETIMEDOUT}},
+    {Errors::OperationAborted, {ECANCELED}},
+    {Errors::DeviceNotConnected, {ENODEV, ENXIO, ESHUTDOWN}},
+    {Errors::NoSystemResources, {EMFILE, ENFILE, ENOSPC, EDQUOT}},
+};
+
+}  // namespace
 
 ErrorCode CodeOf(int errnoValue) {
-    switch (errnoValue) {
-        case 0:
-            return Errors::Success;
-        case ENOENT:
-            return Errors::FileNotFound;
-        case ENOTDIR:
-            return Errors::PathNotFound;
-        case EACCES:
-        case EPERM:
-        case EROFS:
-        case ELOOP:  // a symbolic link where none may be
-        case EISDIR:
-            return Errors::AccessDenied;
-        case EBADF:
-            return Errors::InvalidHandle;
-        case ENOMEM:
-            return Errors::NotEnoughMemory;
-        case EINVAL:
-        case ENAMETOOLONG:
-            return Errors::InvalidParameter;
-        case EBUSY:
-        case EAGAIN:
-            return Errors::Busy;
-        case ENOSYS:
-            return Errors::CallNotImplemented;
-        case EOPNOTSUPP:
-            return Errors::NotSupported;
-        case ETIMEDOUT:
-            return Errors::SemaphoreTimeout;
-        case ECANCELED:
-            return Errors::OperationAborted;
-        case ENODEV:
-        case ENXIO:
-        case ESHUTDOWN:
-            return Errors::DeviceNotConnected;
-        case EMFILE:
-        case ENFILE:
-        case ENOSPC:
-        case EDQUOT:
-            return Errors::NoSystemResources;
-        default:
-            return Errors::GeneralFailure;
-    }
+    const auto* const found = std::ranges::find_if(Meanings, [errnoValue](const Meaning& meaning) {
+        return std::ranges::find(meaning.numbers, errnoValue) != meaning.numbers.end();
+    });
+    return found != std::end(Meanings) ? found->code : Errors::GeneralFailure;
 }
 
 }  // namespace Varnholt::Platform::Linux

@@ -2,51 +2,51 @@
 
 #include <libusb-1.0/libusb.h>
 
+#include <algorithm>
+#include <iterator>
+#include <utility>
+
 namespace Varnholt::Platform::Usb {
+namespace {
+
+/// All others are `Errors::GeneralFailure`: LIBUSB_ERROR_IO, _PIPE, _OVERFLOW, _OTHER.
+constexpr std::pair<int, ErrorCode> Codes[] = {
+    {LIBUSB_SUCCESS, Errors::Success},
+    {LIBUSB_ERROR_ACCESS, Errors::AccessDenied},
+    {LIBUSB_ERROR_NO_DEVICE, Errors::DeviceNotConnected},
+    {LIBUSB_ERROR_NOT_FOUND, Errors::FileNotFound},
+    {LIBUSB_ERROR_BUSY, Errors::Busy},
+    {LIBUSB_ERROR_TIMEOUT, Errors::SemaphoreTimeout},
+    {LIBUSB_ERROR_INVALID_PARAM, Errors::InvalidParameter},
+    {LIBUSB_ERROR_NO_MEM, Errors::NotEnoughMemory},
+    {LIBUSB_ERROR_NOT_SUPPORTED, Errors::NotSupported},
+    {LIBUSB_ERROR_INTERRUPTED, Errors::OperationAborted},
+};
+
+/// All others are `TransferStatus::IoError`.
+constexpr std::pair<int, TransferStatus> Statuses[] = {
+    {LIBUSB_TRANSFER_COMPLETED, TransferStatus::Completed},
+    {LIBUSB_TRANSFER_STALL, TransferStatus::Stalled},
+    {LIBUSB_TRANSFER_OVERFLOW, TransferStatus::Overflow},
+    {LIBUSB_TRANSFER_NO_DEVICE, TransferStatus::DeviceGone},
+    {LIBUSB_TRANSFER_CANCELLED, TransferStatus::Cancelled},
+    {LIBUSB_TRANSFER_TIMED_OUT, TransferStatus::Cancelled},
+};
+
+template <class Meaning, std::size_t Size>
+Meaning Find(const std::pair<int, Meaning> (&meanings)[Size], int number, Meaning others) {
+    const auto* const found = std::ranges::find(meanings, number, &std::pair<int, Meaning>::first);
+    return found != std::end(meanings) ? found->second : others;
+}
+
+}  // namespace
 
 ErrorCode ErrorFromLibUsb(int libusbError) {
-    switch (libusbError) {
-        case LIBUSB_SUCCESS:
-            return Errors::Success;
-        case LIBUSB_ERROR_ACCESS:
-            return Errors::AccessDenied;
-        case LIBUSB_ERROR_NO_DEVICE:
-            return Errors::DeviceNotConnected;
-        case LIBUSB_ERROR_NOT_FOUND:
-            return Errors::FileNotFound;
-        case LIBUSB_ERROR_BUSY:
-            return Errors::Busy;
-        case LIBUSB_ERROR_TIMEOUT:
-            return Errors::SemaphoreTimeout;
-        case LIBUSB_ERROR_INVALID_PARAM:
-            return Errors::InvalidParameter;
-        case LIBUSB_ERROR_NO_MEM:
-            return Errors::NotEnoughMemory;
-        case LIBUSB_ERROR_NOT_SUPPORTED:
-            return Errors::NotSupported;
-        case LIBUSB_ERROR_INTERRUPTED:
-            return Errors::OperationAborted;
-        default:  // LIBUSB_ERROR_IO, _PIPE, _OVERFLOW, _OTHER
-            return Errors::GeneralFailure;
-    }
+    return Find(Codes, libusbError, Errors::GeneralFailure);
 }
 
 TransferStatus StatusFromLibUsb(int libusbTransferStatus) {
-    switch (libusbTransferStatus) {
-        case LIBUSB_TRANSFER_COMPLETED:
-            return TransferStatus::Completed;
-        case LIBUSB_TRANSFER_STALL:
-            return TransferStatus::Stalled;
-        case LIBUSB_TRANSFER_OVERFLOW:
-            return TransferStatus::Overflow;
-        case LIBUSB_TRANSFER_NO_DEVICE:
-            return TransferStatus::DeviceGone;
-        case LIBUSB_TRANSFER_CANCELLED:
-        case LIBUSB_TRANSFER_TIMED_OUT:
-            return TransferStatus::Cancelled;
-        default:
-            return TransferStatus::IoError;
-    }
+    return Find(Statuses, libusbTransferStatus, TransferStatus::IoError);
 }
 
 }  // namespace Varnholt::Platform::Usb

@@ -32,35 +32,27 @@ class Writer final : Cursor<std::uint8_t> {
     explicit Writer(std::span<std::uint8_t> message) : Cursor(message) {}
 
     Writer& Byte(std::uint8_t value) {
-        if (const auto field = Take(1); !field.empty()) {
-            field[0] = value;
-        }
-        return *this;
+        return Put(
+            +[](std::uint8_t* field, std::uint8_t byte) { *field = byte; }, value);
     }
-    Writer& Big16(std::uint16_t value) {
-        if (const auto field = Take(2); !field.empty()) {
-            Protocol::StoreBig16(field.data(), value);
-        }
-        return *this;
-    }
-    Writer& Big32(std::uint32_t value) {
-        if (const auto field = Take(4); !field.empty()) {
-            Protocol::StoreBig32(field.data(), value);
-        }
-        return *this;
-    }
-    Writer& Little16(std::uint16_t value) {
-        if (const auto field = Take(2); !field.empty()) {
-            Protocol::StoreLittle16(field.data(), value);
-        }
-        return *this;
-    }
+    Writer& Big16(std::uint16_t value) { return Put(Protocol::StoreBig16, value); }
+    Writer& Big32(std::uint32_t value) { return Put(Protocol::StoreBig32, value); }
+    Writer& Little16(std::uint16_t value) { return Put(Protocol::StoreLittle16, value); }
     /// Zero-terminated, padded with zeros.
     Writer& Text(const std::string& text, std::size_t size) {
         const auto field = Take(size);
         std::ranges::fill(field, std::uint8_t{0});
         if (!field.empty()) {
             std::copy_n(text.begin(), std::min(text.size(), size - 1), field.begin());
+        }
+        return *this;
+    }
+
+  private:
+    template <class Value>
+    Writer& Put(void (*store)(std::uint8_t*, Value), Value value) {
+        if (const auto field = Take(sizeof value); !field.empty()) {
+            store(field.data(), value);
         }
         return *this;
     }
@@ -71,24 +63,21 @@ class Reader final : Cursor<const std::uint8_t> {
     explicit Reader(std::span<const std::uint8_t> message) : Cursor(message) {}
 
     std::uint8_t Byte() {
-        const auto field = Take(1);
-        return field.empty() ? std::uint8_t{0} : field[0];
+        return Get(+[](const std::uint8_t* field) { return *field; });
     }
-    std::uint16_t Big16() {
-        const auto field = Take(2);
-        return field.empty() ? std::uint16_t{0} : Protocol::LoadBig16(field.data());
-    }
-    std::uint32_t Big32() {
-        const auto field = Take(4);
-        return field.empty() ? 0 : Protocol::LoadBig32(field.data());
-    }
-    std::uint16_t Little16() {
-        const auto field = Take(2);
-        return field.empty() ? std::uint16_t{0} : Protocol::LoadLittle16(field.data());
-    }
+    std::uint16_t Big16() { return Get(Protocol::LoadBig16); }
+    std::uint32_t Big32() { return Get(Protocol::LoadBig32); }
+    std::uint16_t Little16() { return Get(Protocol::LoadLittle16); }
     std::string Text(std::size_t size) {
         const auto field = Take(size);
         return {field.begin(), std::ranges::find(field, std::uint8_t{0})};
+    }
+
+  private:
+    template <class Value>
+    Value Get(Value (*load)(const std::uint8_t*)) {
+        const auto field = Take(sizeof(Value));
+        return field.empty() ? Value{0} : load(field.data());
     }
 };
 
