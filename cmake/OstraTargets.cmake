@@ -1,6 +1,7 @@
 # One place that says how this project's code is compiled; every target goes through one of these helpers.
 
 option(OSTRA_WERROR "Take the compiler's warnings for errors, as ./check does" OFF)
+option(OSTRA_SYMBOLS "Compile line numbers in, for the files of symbols beside what is shipped" "${WIN32}")
 set(OSTRA_SANITIZE "" CACHE STRING "Sanitizers to build with, as in -fsanitize= (empty: none)")
 set(CMAKE_CXX_STANDARD 20)
 set(CMAKE_CXX_STANDARD_REQUIRED ON)
@@ -52,6 +53,7 @@ endif()
 function(ostra_library NAME)
   cmake_parse_arguments(ARG "" "" "SOURCES;LINK" ${ARGN})
   add_library(${NAME} STATIC ${ARG_SOURCES})
+  target_compile_options(${NAME} PRIVATE $<$<BOOL:${OSTRA_SYMBOLS}>:-g1>)
   target_link_libraries(${NAME} PUBLIC ostra_options ${ARG_LINK})
 endfunction()
 
@@ -60,6 +62,31 @@ function(ostra_program NAME)
   cmake_parse_arguments(ARG "" "" "SOURCES;LINK" ${ARGN})
   add_executable(${NAME} ${ARG_SOURCES})
   target_link_libraries(${NAME} PRIVATE ${ARG_LINK} ostra_options)
+endfunction()
+
+# ostra_shipped(TARGET FILE DESCRIPTION): what users get. On Windows, where it is called FILE, it says in its properties what it
+# is and of which version, keeps its symbols in FILE.debug beside it, and has the same bytes whenever it is built.
+function(ostra_shipped TARGET FILE DESCRIPTION)
+  target_compile_options(${TARGET} PRIVATE $<$<BOOL:${OSTRA_SYMBOLS}>:-g1>)
+  if(NOT WIN32)
+    return()
+  endif()
+  string(REPLACE "." "," VERSION_NUMBERS "${PROJECT_VERSION}")
+  set(FILE_TYPE VFT_APP)
+  if(FILE MATCHES "\\.dll$")
+    set(FILE_TYPE VFT_DLL)
+  endif()
+  set(RESOURCE "${CMAKE_CURRENT_BINARY_DIR}/${FILE}.rc")
+  configure_file("${PROJECT_SOURCE_DIR}/packaging/version.rc.in" "${RESOURCE}" @ONLY)
+  # Apart from the target, whose options are not for the resource compiler.
+  add_library(${TARGET}_version OBJECT "${RESOURCE}")
+  target_sources(${TARGET} PRIVATE $<TARGET_OBJECTS:${TARGET}_version>)
+  target_link_options(${TARGET} PRIVATE LINKER:--no-insert-timestamp)
+  set(OBJCOPY "${CMAKE_COMMAND}" -E env SOURCE_DATE_EPOCH=0 "${CMAKE_OBJCOPY}")
+  add_custom_command(TARGET ${TARGET} POST_BUILD
+    COMMAND ${OBJCOPY} --only-keep-debug $<TARGET_FILE:${TARGET}> ${FILE}.debug
+    COMMAND ${OBJCOPY} --strip-all --add-gnu-debuglink=${FILE}.debug $<TARGET_FILE:${TARGET}>
+    BYPRODUCTS ${FILE}.debug VERBATIM)
 endfunction()
 
 # ostra_test(NAME SOURCES ... [LINK ...] [EXACT_TIME ...] [WAITS_LONG]): a GoogleTest program, run by ctest as one test

@@ -6,12 +6,14 @@ set(CPACK_PACKAGE_VENDOR ostra)
 set(CPACK_PACKAGE_CONTACT "ostra maintainers <maintainers@users.noreply.c-seed-f42350d1.example>")
 set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "driver library and tools of a USB hand-held optical measuring instrument")
 set(CPACK_PACKAGE_VERSION "${PROJECT_VERSION}")
-set(CPACK_STRIP_FILES ON)
 set(CPACK_VERBATIM_VARIABLES ON)
 set(CPACK_INSTALL_DEFAULT_DIRECTORY_PERMISSIONS
   OWNER_READ OWNER_WRITE OWNER_EXECUTE GROUP_READ GROUP_EXECUTE WORLD_READ WORLD_EXECUTE)
 
 set(CPACK_COMPONENTS_ALL library development tools)
+if(WIN32)
+  list(APPEND CPACK_COMPONENTS_ALL symbols)
+endif()
 set(CPACK_DEB_COMPONENT_INSTALL ON)
 set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
 set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
@@ -37,6 +39,13 @@ set(CPACK_DEBIAN_TOOLS_DESCRIPTION "command line of a hand-held optical measurin
  Lists instruments, takes readouts and scans, backs up, checks and writes
  EEPROM images. Comes with a simulated instrument for work without hardware.")
 set(CPACK_DEBIAN_TOOLS_PACKAGE_CONTROL_EXTRA "${CMAKE_CURRENT_SOURCE_DIR}/debian/postrm")
+# Debian has symbols in packages of their own; to make them CPack takes what they hold from the files and strips those.
+set(CPACK_DEBIAN_DEBUGINFO_PACKAGE ${OSTRA_DEBIAN})
+if(OSTRA_DEBIAN OR WIN32)
+  set(CPACK_STRIP_FILES OFF)
+else()
+  set(CPACK_STRIP_FILES ON)
+endif()
 set(CPACK_POST_BUILD_SCRIPTS "${CMAKE_CURRENT_SOURCE_DIR}/Repack.cmake")
 
 if(OSTRA_DEBIAN)

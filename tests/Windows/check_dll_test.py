@@ -36,6 +36,14 @@ def with_ordinal_base(content, change):
     return bytes(copy)
 
 
+def with_version(content, change):
+    """Changes the low half of the file's version, which is 12 bytes behind the signature of the version information."""
+    copy = bytearray(content)
+    place = content.index(struct.pack("<I", 0xFEEF04BD)) + 12
+    struct.pack_into("<I", copy, place, change(struct.unpack_from("<I", content, place)[0]))
+    return bytes(copy)
+
+
 CHANGES = {
     "an export of another name": lambda dll: replaced(dll, b"d4fb86cecc88582a\0", b"d4fb86cecc88582b\0"),
     "ordinals moved by one": lambda dll: with_ordinal_base(dll, lambda base: base + 1),
@@ -44,7 +52,14 @@ CHANGES = {
     "another machine": lambda dll: with_header_field(dll, 4, "<H", lambda _: 0x8664),
     "no library": lambda dll: with_header_field(dll, 22, "<H", lambda flags: flags & ~0x2000),
     "for a later Windows": lambda dll: with_header_field(dll, 24 + 48, "<H", lambda _: 6),
-    "symbols": lambda dll: with_header_field(dll, 12, "<I", lambda _: 4096),
+    "symbols": lambda dll: with_header_field(dll, 16, "<I", lambda _: 4096),
+    "symbols in another file": lambda dll: replaced(dll, b"ostra.dll.debug\0", b"ostra.dll.bogus\0"),
+    "a fixed address": lambda dll: with_header_field(dll, 24 + 70, "<H", lambda flags: flags & ~0x40),
+    "data that may be run": lambda dll: with_header_field(dll, 24 + 70, "<H", lambda flags: flags & ~0x100),
+    "no relocations": lambda dll: with_header_field(dll, 24 + 96 + 8 * 5, "<I", lambda _: 0),
+    "no resources": lambda dll: with_header_field(dll, 24 + 96 + 8 * 2, "<I", lambda _: 0),
+    "another version": lambda dll: with_version(dll, lambda version: version + 1),
+    "the time of the build": lambda dll: with_header_field(dll, 8, "<I", lambda _: 1),
 }
 
 
@@ -53,10 +68,10 @@ def main():
     content = pathlib.Path(library).read_bytes()
 
     def passes(tried):
-        with tempfile.NamedTemporaryFile(suffix=".dll") as file:
-            file.write(tried)
-            file.flush()
-            return subprocess.run([sys.executable, check, file.name], capture_output=True, check=False).returncode == 0
+        with tempfile.TemporaryDirectory() as folder:
+            copy = pathlib.Path(folder, pathlib.Path(library).name)
+            copy.write_bytes(tried)
+            return subprocess.run([sys.executable, check, copy], capture_output=True, check=False).returncode == 0
 
     wrong = [] if passes(content) else ["the library itself does not pass"]
     wrong += [f"passes: {name}" for name, change in CHANGES.items() if passes(change(content))]
