@@ -1,5 +1,6 @@
 #include "ProgramOptions.h"
 
+#include <CLI/App.hpp>
 #include <CLI/Config.hpp>
 #include <CLI/Formatter.hpp>
 #include <CLI/Validators.hpp>
@@ -144,6 +145,17 @@ void DefineOptions(CLI::App& program, ProgramOptions& options) {
     program.add_option("--capture", options.captureFile, "record the USB traffic in a pcapng file")
         ->type_name("FILE");
     program.add_flag("-v,--verbose", options.verbose, "tell on standard error what happens");
+}
+
+std::optional<int> ReadOptions(int argc, char** argv, ProgramOptions& options) {
+    CLI::App program;
+    DefineOptions(program, options);
+    try {
+        program.parse(argc, argv);
+        return std::nullopt;
+    } catch (const CLI::ParseError& error) {
+        return program.exit(error) == 0 ? 0 : UsageError;
+    }
 }
 
 std::vector<std::string> InstrumentNames(const ProgramOptions& options) {

@@ -1,12 +1,15 @@
 #pragma once
 
-#include <CLI/App.hpp>
 #include <cstdint>
 #include <optional>
 #include <string>
 #include <vector>
 
 #include "Protocol/Instrument.h"
+
+namespace CLI {
+class App;
+}
 
 namespace Varnholt::Simulator {
 
@@ -35,6 +38,13 @@ struct ProgramOptions {
 
 /// `options` must outlive `program`.
 void DefineOptions(CLI::App& program, ProgramOptions& options);
+
+/// Reads the command line; what is wrong with it is said on standard error. When the program has nothing more
+/// to do, for that reason or because it was asked for help, gives its exit code.
+std::optional<int> ReadOptions(int argc, char** argv, ProgramOptions& options);
+
+/// Of a command line that cannot be used, and of a start that failed.
+inline constexpr int UsageError = 2;
 
 /// The names of the instruments that are asked for. Throws `std::runtime_error` with a text for people.
 std::vector<std::string> InstrumentNames(const ProgramOptions& options);

@@ -188,20 +188,15 @@ void Run(const ProgramOptions& options) {
 
 int main(int argc, char** argv) {
     Varnholt::Platform::SecureStandardStreams();
-    constexpr int usageError = 2;
     ProgramOptions options;
-    CLI::App program;
-    DefineOptions(program, options);
-    try {
-        program.parse(argc, argv);
-    } catch (const CLI::ParseError& error) {
-        return program.exit(error) == 0 ? 0 : usageError;
+    if (const std::optional<int> code = ReadOptions(argc, argv, options)) {
+        return *code;
     }
     try {
         Run(options);
         return 0;
     } catch (const std::exception& error) {
         std::cerr << "ostra-simulator: " << error.what() << "\n";
-        return usageError;
+        return UsageError;
     }
 }
