@@ -78,7 +78,7 @@ class Shipped : public testing::Test {
     static std::unique_ptr<ShippedLibrary> library;
 
   public:
-    static std::string nativeDriver, usbIoDriver, tool, example;
+    static std::string nativeDriver, usbIoDriver, tool, example, simulatedLibrary;
 };
 
 std::unique_ptr<StandInDriver> Shipped::driver;
@@ -87,6 +87,7 @@ std::string Shipped::nativeDriver;
 std::string Shipped::usbIoDriver;
 std::string Shipped::tool;
 std::string Shipped::example;
+std::string Shipped::simulatedLibrary;
 
 using Values = std::array<std::int32_t, OSTRA_READOUT_VALUES>;
 
@@ -210,6 +211,17 @@ std::pair<DWORD, std::string> RunProgram(const std::string& commandLine) {
     return {code, Content(PrintedPath)};
 }
 
+Values ReadoutInProcess(std::uint64_t seed) {
+    Values values{};
+    TranscriptInProcess(seed, [&] { Interface::TakeReadout(values, ""); });
+    return values;
+}
+
+std::vector<std::int32_t> ValuesIn(const std::string& printed) {
+    std::istringstream stream(printed);
+    return {std::istream_iterator<std::int32_t>(stream), {}};
+}
+
 /// From an image made by the tool to a readout by the example host.
 TEST_F(Shipped, ProgramsDoTheWholeJob) {
     const std::string listing = Quoted(tool) + " list --json";
@@ -225,13 +237,28 @@ TEST_F(Shipped, ProgramsDoTheWholeJob) {
     const auto [exampleCode, values] =
         RunProgram(Quoted(example) + ' ' + Quoted(ShippedLibrary::path) + " \"\" C:\\image");
     EXPECT_EQ(exampleCode, 0U) << values;
-    std::istringstream stream(values);
-    Values inProcess{};
-    TranscriptInProcess(driver->SeedOf(path), [&] { Interface::TakeReadout(inProcess, ""); });
-    EXPECT_THAT(std::vector<std::int32_t>(std::istream_iterator<std::int32_t>(stream), {}),
-                testing::ElementsAreArray(inProcess));
+    EXPECT_THAT(ValuesIn(values), testing::ElementsAreArray(ReadoutInProcess(driver->SeedOf(path))));
     const std::string image = Content("C:\\image");
     EXPECT_EQ(Instrument(path).Eeprom(), std::vector<BYTE>(image.begin(), image.end()));
+}
+
+/// Without any driver: the instruments are in the host's process.
+TEST(Simulated, HostTakesAReadoutAndIsToldOfAFailure) {
+    SetEnvironmentVariableA("OSTRA_SIMULATED",
+                            "time=real name=broken faults=\"bulk-in 0:stall\" name=lab seed=7");
+    const std::string transport = StandInDriver::HostIs64Bit() ? "usbio" : "native";
+    const auto run = [&](const std::string& name) {
+        return RunProgram(Quoted(Shipped::example) + ' ' + Quoted(Shipped::simulatedLibrary) + ' ' +
+                          transport + "/simulated-" + name);
+    };
+    const auto [code, values] = run("lab");
+    EXPECT_EQ(code, 0U) << values;
+    EXPECT_THAT(ValuesIn(values), testing::ElementsAreArray(ReadoutInProcess(7)));
+    const auto [failureCode, reason] = run("broken");
+    EXPECT_EQ(failureCode, 1U);
+    EXPECT_THAT(reason, HasSubstr("no readout: "));
+    EXPECT_THAT(reason, testing::Not(HasSubstr("no such instrument")));
+    SetEnvironmentVariableA("OSTRA_SIMULATED", nullptr);
 }
 
 /// Tells Wine where the program of that name gets its setupapi from.
@@ -307,8 +334,8 @@ int main(int argc, char** argv) {
         ShippedLibrary::path = argv[1];
         return RunAsChild(argv[2], argv[3]);
     }
-    if (argc != 6) {
-        std::puts("usage: shipped_library_test LIBRARY NATIVE-DRIVER USBIO-DRIVER TOOL EXAMPLE");
+    if (argc != 7) {
+        std::puts("usage: shipped_library_test LIBRARY NATIVE-DRIVER USBIO-DRIVER TOOL EXAMPLE SIMULATED");
         return 2;
     }
     ShippedLibrary::path = argv[1];
@@ -316,5 +343,6 @@ int main(int argc, char** argv) {
     Shipped::usbIoDriver = argv[3];
     Shipped::tool = argv[4];
     Shipped::example = argv[5];
+    Shipped::simulatedLibrary = argv[6];
     return RUN_ALL_TESTS();
 }
