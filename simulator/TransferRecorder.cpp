@@ -13,7 +13,6 @@ namespace Varnholt::Simulator {
 
 using Capture::Hexadecimal;
 using Capture::InterceptingDevice;
-using Platform::Usb::Transfer;
 using Platform::Usb::TransferStatus;
 using Platform::Usb::UsbDevice;
 

@@ -8,7 +8,6 @@ namespace Varnholt::UsbIo {
 
 using namespace Protocol::UsbIoDriver;
 using Platform::NoHandle;
-using Platform::RecursiveMutex;
 
 CUsbIoThread::~CUsbIoThread() {
     FreeBuffers();

@@ -59,7 +59,8 @@ struct DeviceRecord {
     std::uint32_t DeviceId() const { return busNumber << 16 | deviceNumber; }
     bool operator==(const DeviceRecord&) const = default;
 };
-inline constexpr std::size_t DeviceRecordSize = PathSize + BusIdSize + 3 * 4 + 3 * 2 + 6;
+inline constexpr std::size_t DeviceRecordSize =
+    PathSize + BusIdSize + 3 * sizeof(std::uint32_t) + 3 * sizeof(std::uint16_t) + 6;
 static_assert(DeviceRecordSize == 312);
 
 /// Follows a device record in a list, once for each interface: class, subclass, protocol, padding.

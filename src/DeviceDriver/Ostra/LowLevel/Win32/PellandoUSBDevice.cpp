@@ -26,7 +26,6 @@
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 namespace NativeDriver = Protocol::NativeDriver;
-using Generic::EventListener;
 using Generic::Utilities::IOException;
 using Generic::Utilities::Shortfall;
 using Generic::Utilities::TimeoutException;
