@@ -14,6 +14,14 @@ std::string CompletionOf(const OptionDescription& option) {
             return "COMPREPLY=($(compgen -W '" + Joined(option.values) + "' -- \"$current\"))";
         case Takes::Instrument:
             return "COMPREPLY=($(compgen -W \"$(" + std::string(ListInstruments) + ")\" -- \"$current\"))";
+        case Takes::Candidate:
+            // A colon ends a word for bash, so that only what stands behind it is replaced.
+            return "current=${COMP_LINE:0:COMP_POINT}; current=${current##* }\n            "
+                   "COMPREPLY=($(compgen -W "
+                   "\"$(" +
+                   std::string(ListCandidates) +
+                   ")\" -- \"$current\"))\n            [[ $current != *:* || $COMP_WORDBREAKS != *:* ]] || "
+                   "COMPREPLY=(\"${COMPREPLY[@]#\"${current%:*}:\"}\")";
         case Takes::File:
             return "compopt -o filenames 2>/dev/null; mapfile -t COMPREPLY < <(compgen -f -- \"$current\")";
         case Takes::CommandName:

@@ -6,7 +6,7 @@
 namespace Varnholt::Manual {
 
 /// What can stand behind an option, or as an argument, as a shell can complete it.
-enum class Takes { Nothing, Text, File, Instrument, OneOf, CommandName };
+enum class Takes { Nothing, Text, File, Instrument, Candidate, OneOf, CommandName };
 
 /// An option, flag or argument, as the help describes it.
 struct OptionDescription {

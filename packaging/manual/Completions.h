@@ -7,8 +7,8 @@
 
 namespace Varnholt::Manual {
 
-// Completion scripts: commands, options, values of options that have a fixed set, files, and instruments that
-// are connected, which the script asks the tool for.
+// Completion scripts: commands, options, values of options that have a fixed set, files, instruments that are
+// connected, and devices that could be registered: the script asks the tool for both.
 
 std::string BashCompletion(const CommandDescription& program);
 std::string ZshCompletion(const CommandDescription& program);
@@ -25,5 +25,8 @@ std::string Joined(const std::vector<std::string>& texts);
 std::string FunctionName(const CommandDescription& command);
 /// Shell: prints the instruments' names, one a line.
 inline constexpr const char* ListInstruments = "ostra list 2>/dev/null | sed -n '1!s/ .*//p'";
+/// Shell: prints vendor and product numbers of what could be an instrument, one pair a line.
+inline constexpr const char* ListCandidates =
+    "ostra list --candidates 2>/dev/null | sed -nE '1!s/^[^ ]+ +([^ ]+).*/\\1/p'";
 
 }  // namespace Varnholt::Manual

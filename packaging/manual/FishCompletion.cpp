@@ -19,6 +19,8 @@ std::string ValueOf(const OptionDescription& option) {
             return " -x -a '" + Joined(option.values) + "'";
         case Takes::Instrument:
             return " -x -a '(__ostra_instruments)'";
+        case Takes::Candidate:
+            return " -x -a '(__ostra_candidates)'";
         case Takes::File:
             return " -r -F";
         case Takes::Text:
@@ -45,6 +47,9 @@ std::string LinesOf(const CommandDescription& program, const CommandDescription&
         text += ValueOf(option) + " -d " + QuotedForFish(option.about) + "\n";
     }
     for (const OptionDescription& argument : command.arguments) {
+        if (argument.takes == Takes::Candidate) {
+            text += begin + ValueOf(argument) + "\n";
+        }
         if (argument.takes == Takes::File) {
             text += begin + " -F\n";
         }
@@ -77,7 +82,8 @@ std::string FishCompletion(const CommandDescription& program) {
     const std::string function = "_" + FunctionName(program);
     std::string text = "# Completion of " + program.name + " for fish\n\n";
     if (!program.commands.empty()) {
-        text += "function __ostra_instruments\n    " + std::string(ListInstruments) + "\nend\n\n";
+        text += "function __ostra_instruments\n    " + std::string(ListInstruments) +
+                "\nend\n\nfunction __ostra_candidates\n    " + std::string(ListCandidates) + "\nend\n\n";
     }
     text +=
         "# Whether the command that is being typed is this one.\nfunction " + function +

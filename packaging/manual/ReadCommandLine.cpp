@@ -75,6 +75,9 @@ Takes WhatIsTaken(const CLI::Option& option, const OptionDescription& descriptio
     if (option.check_lname("device")) {
         return Takes::Instrument;
     }
+    if (option.check_name("VID:PID")) {
+        return Takes::Candidate;
+    }
     if (option.check_name("COMMAND")) {
         return Takes::CommandName;
     }

@@ -25,6 +25,8 @@ std::string ActionOf(const OptionDescription& option) {
             return "(" + Joined(option.values) + ")";
         case Takes::Instrument:
             return "_ostra_instruments";
+        case Takes::Candidate:
+            return "_ostra_candidates";
         case Takes::File:
             return "_files";
         case Takes::CommandName:
@@ -87,10 +89,14 @@ std::string FunctionOf(const CommandDescription& command) {
 std::string ZshCompletion(const CommandDescription& program) {
     std::string text = "#compdef " + program.name + "\n# Completion of " + program.name + " for zsh\n\n";
     if (!program.commands.empty()) {
-        text += "_ostra_instruments() {\n    local -a names\n    names=(${(f)\"$(" +
-                std::string(ListInstruments) +
-                ")\"})\n    _describe instrument names\n}\n\n_ostra_command_names() {\n    local -a names\n  "
-                "  names=(";
+        text +=
+            "_ostra_instruments() {\n    local -a names\n    names=(${(f)\"$(" +
+            std::string(ListInstruments) +
+            ")\"})\n    _describe instrument names\n}\n\n_ostra_candidates() {\n    local -a numbers\n    "
+            "numbers=(${(f)\"$(" +
+            std::string(ListCandidates) +
+            ")\"})\n    compadd -a numbers\n}\n\n_ostra_command_names() {\n    local -a names\n  "
+            "  names=(";
         for (const CommandDescription& command : program.commands) {
             text += command.name + " ";
         }
