@@ -41,13 +41,13 @@ void Monitor(Session& session, const MonitorOptions& options) {
     Service::EventWatch watch(session.Context(), ChooseInstrument(session, options.instrument));
     session.Note("watching " + watch.Identifier() + "; Ctrl-C ends");
     for (;;) {
-        while (const auto event = watch.Next()) {
+        while (const auto event = watch.Events().Next()) {
             Print(session, *event, options.json);
             if (event->kind == Service::EventKind::Removed) {
                 return;
             }
         }
-        const bool isOver = options.seconds > 0 && watch.Seconds() >= options.seconds;
+        const bool isOver = options.seconds > 0 && watch.Events().Seconds() >= options.seconds;
         if (isOver || !session.UserInterruption().Sleep(LookInterval)) {
             return;
         }

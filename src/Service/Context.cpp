@@ -29,9 +29,18 @@ bool IsOwn(const std::exception_ptr& exception) {
 Context::Context(Observer& toldObserver, Interruption& userInterruption)
     : observer_(toldObserver),
       interruption_(userInterruption),
-      files_(Platform::DeviceFiles()),
-      filesInForce_(files_) {
-    interruption_.SetAction([this] { files_.Interrupt(); });
+      ownFiles_(std::make_unique<OwnFiles>()),
+      files_(ownFiles_->files) {
+    interruption_.SetAction([this] { files_.Interrupt(device_); });
+}
+
+Context::Context(Observer& toldObserver, Interruption& userInterruption,
+                 InterruptibleDeviceFiles& sharedFiles, std::string deviceIdentifier)
+    : observer_(toldObserver),
+      interruption_(userInterruption),
+      files_(sharedFiles),
+      device_(std::move(deviceIdentifier)) {
+    interruption_.SetAction([this] { files_.Interrupt(device_); });
 }
 
 Context::~Context() {

@@ -12,22 +12,28 @@
 
 namespace Varnholt::Service {
 
-/// Within what instruments are used: who is told, how the user ends it, and which transport is taken. For its
-/// life the device files that were in force can be interrupted, and an interruption does that. One thread
-/// uses it; the interruption may come from any.
+/// Within what instruments are used: who is told, how the user ends it, and which transport is taken. One
+/// thread uses it; the interruption may come from any.
 class Context final {
   public:
     using Transport = DeviceDriver::Ostra::Transport;
 
-    /// Both must outlive the object.
+    /// Both must outlive the object. For its life the device files that were in force can be interrupted, and
+    /// an interruption does that.
     Context(Observer& toldObserver, Interruption& userInterruption);
+    /// The same for one instrument of several that are used at the same time: `sharedFiles` are in force
+    /// already, outlive the object too, and an interruption ends what runs on the device with this
+    /// identifier.
+    Context(Observer& toldObserver, Interruption& userInterruption, InterruptibleDeviceFiles& sharedFiles,
+            std::string deviceIdentifier);
     ~Context();
     Context(const Context&) = delete;
     Context& operator=(const Context&) = delete;
 
     Observer& Told() const { return observer_; }
     Interruption& UserInterruption() const { return interruption_; }
-    InterruptibleDeviceFiles& Files() { return files_; }
+    /// After an interruption: transfers may start again.
+    void Resume() { files_.Resume(device_); }
     /// As `Observer::StartProgress`, and never null.
     std::unique_ptr<Progress> StartProgress(const std::string& title, std::uint64_t total,
                                             const std::string& unit) const;
@@ -45,10 +51,16 @@ class Context final {
     Failure Explain(const std::exception_ptr& exception, const std::string& identifier = {}) const;
 
   private:
+    struct OwnFiles {
+        InterruptibleDeviceFiles files{Platform::DeviceFiles()};
+        const Platform::ScopedDeviceFiles inForce{files};
+    };
+
     Observer& observer_;
     Interruption& interruption_;
-    InterruptibleDeviceFiles files_;
-    const Platform::ScopedDeviceFiles filesInForce_;
+    const std::unique_ptr<OwnFiles> ownFiles_;
+    InterruptibleDeviceFiles& files_;
+    const std::string device_;  ///< empty: all
     std::optional<Transport> chosenTransport_;
 };
 

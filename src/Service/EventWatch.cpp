@@ -12,18 +12,37 @@ constexpr int LooksForAGoneOne = 50;
 
 }  // namespace
 
-void EventWatch::Mailbox::MessageFromDevice(std::uint32_t code, std::uint32_t) {
+void EventMailbox::MessageFromDevice(std::uint32_t code, std::uint32_t) {
     const std::lock_guard holder(section_);
-    waiting_.push_back({code, time_.Milliseconds()});
+    for (EventReader* const reader : readers_) {
+        reader->waiting_.push_back({code, time_.Milliseconds()});
+        Platform::SignalEvent(reader->arrived_.Get());
+    }
 }
 
-std::uint64_t EventWatch::Mailbox::Now() {
-    const std::lock_guard holder(section_);
-    return time_.Milliseconds();
+EventReader::EventReader(EventMailbox& mailbox, OpenedInstrument& listenedTo)
+    : mailbox_(mailbox), instrument_(listenedTo), arrived_(Platform::MakeAutoResetEvent()) {
+    const std::lock_guard holder(mailbox_.section_);
+    start_ = mailbox_.time_.Milliseconds();
+    mailbox_.readers_.push_back(this);
 }
 
-std::optional<EventWatch::Mailbox::Message> EventWatch::Mailbox::Take() {
-    const std::lock_guard holder(section_);
+EventReader::~EventReader() {
+    const std::lock_guard holder(mailbox_.section_);
+    std::erase(mailbox_.readers_, this);
+}
+
+double EventReader::Seconds() const {
+    const std::lock_guard holder(mailbox_.section_);
+    return SecondsOf(mailbox_.time_.Milliseconds());
+}
+
+double EventReader::SecondsOf(std::uint64_t milliseconds) const {
+    return static_cast<double>(milliseconds - start_) / 1000;
+}
+
+std::optional<EventReader::Message> EventReader::Take() {
+    const std::lock_guard holder(mailbox_.section_);
     if (waiting_.empty()) {
         return std::nullopt;
     }
@@ -32,17 +51,8 @@ std::optional<EventWatch::Mailbox::Message> EventWatch::Mailbox::Take() {
     return first;
 }
 
-EventWatch::EventWatch(Context& context, const FoundInstrument& found)
-    : instrument_(context, found, &messages_),
-      deferral_(context.UserInterruption()),
-      start_(messages_.Now()) {}
-
-double EventWatch::SecondsOf(std::uint64_t milliseconds) const {
-    return static_cast<double>(std::max(milliseconds, start_) - start_) / 1000;
-}
-
-std::optional<InstrumentEvent> EventWatch::Next() {
-    const auto message = messages_.Take();
+std::optional<InstrumentEvent> EventReader::Next() {
+    const auto message = Take();
     if (!message) {
         return std::nullopt;
     }
@@ -53,17 +63,21 @@ std::optional<InstrumentEvent> EventWatch::Next() {
         if (!IsRemoved()) {
             throw Failure(FailureKind::TransferFailed, "its events could not be read any more",
                           "it is still connected: watch it again")
-                .Of(Identifier());
+                .Of(instrument_.Identifier());
         }
         event.kind = EventKind::Removed;
     }
     return event;
 }
 
+void EventReader::Wait(std::uint32_t milliseconds) const {
+    Platform::Wait(arrived_.Get(), milliseconds);
+}
+
 /// The end of the messages looks like a removal, whatever ended them.
-bool EventWatch::IsRemoved() {
+bool EventReader::IsRemoved() const {
     for (int look = 0; look < LooksForAGoneOne; ++look) {
-        if (!IsConnected(instrument_.UsedContext(), Identifier())) {
+        if (!IsConnected(instrument_.UsedContext(), instrument_.Identifier())) {
             return true;
         }
         if (!instrument_.UsedContext().UserInterruption().Sleep(LookInterval)) {

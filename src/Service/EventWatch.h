@@ -2,7 +2,9 @@
 
 #include <deque>
 #include <optional>
+#include <vector>
 
+#include "Platform/Handle.h"
 #include "Platform/WaitableObjects.h"
 #include "Service/ElapsedTime.h"
 #include "Service/OpenedInstrument.h"
@@ -15,47 +17,71 @@ enum class EventKind { Button, Removed, Unknown };
 struct InstrumentEvent {
     EventKind kind;
     std::uint32_t code;  ///< as the library passes it on
-    double seconds;      ///< since the watch began
+    double seconds;      ///< since the reader was made
 };
 
-/// Watches the button and the removal of an instrument, which it opens. The user's wish to end does not cut
-/// off its transfers: aborted pipes would look like an instrument that is gone.
-class EventWatch final {
-  public:
-    EventWatch(Context& context, const FoundInstrument& found);
+class EventReader;
 
-    const std::string& Identifier() const { return instrument_.Identifier(); }
-    double Seconds() { return SecondsOf(messages_.Now()); }
+/// Takes messages on the instrument's thread and hands them to readers on their own. Any thread; outlives the
+/// instrument that it listens to.
+class EventMailbox final : public DeviceDriver::Generic::EventListener {
+  public:
+    void MessageFromDevice(std::uint32_t code, std::uint32_t detail) override;
+
+  private:
+    friend class EventReader;
+
+    Platform::RecursiveMutex section_;  ///< guards what follows, and what the readers have waiting
+    ElapsedTime time_;
+    std::vector<EventReader*> readers_;
+};
+
+/// What comes into a mailbox from the reader's making on. The mailbox and the instrument that it listens to
+/// outlive the reader, which one thread uses.
+class EventReader final {
+  public:
+    EventReader(EventMailbox& mailbox, OpenedInstrument& listenedTo);
+    ~EventReader();
+    EventReader(const EventReader&) = delete;
+    EventReader& operator=(const EventReader&) = delete;
+
+    double Seconds() const;
     /// The next one that came, if one did. Throws when events cannot be read any more although the instrument
     /// is still connected.
     std::optional<InstrumentEvent> Next();
+    /// Returns when something came since the last wait, or after that time.
+    void Wait(std::uint32_t milliseconds) const;
 
   private:
-    /// Takes messages on the instrument's thread and hands them to the watch's.
-    class Mailbox final : public DeviceDriver::Generic::EventListener {
-      public:
-        struct Message {
-            std::uint32_t code;
-            std::uint64_t milliseconds;  ///< on the mailbox's clock
-        };
-
-        void MessageFromDevice(std::uint32_t code, std::uint32_t detail) override;
-        std::uint64_t Now();
-        std::optional<Message> Take();
-
-      private:
-        Platform::RecursiveMutex section_;  ///< guards what follows
-        ElapsedTime time_;
-        std::deque<Message> waiting_;
+    friend class EventMailbox;
+    struct Message {
+        std::uint32_t code;
+        std::uint64_t milliseconds;  ///< on the mailbox's clock
     };
 
+    std::optional<Message> Take();
     double SecondsOf(std::uint64_t milliseconds) const;
-    bool IsRemoved();
+    bool IsRemoved() const;
 
-    Mailbox messages_;
+    EventMailbox& mailbox_;
+    OpenedInstrument& instrument_;
+    const Platform::OwnedHandle arrived_;
+    std::uint64_t start_ = 0;
+    std::deque<Message> waiting_;
+};
+
+/// Watches the button and the removal of an instrument, which it opens.
+class EventWatch final {
+  public:
+    EventWatch(Context& context, const FoundInstrument& found) : instrument_(context, found, &mailbox_) {}
+
+    const std::string& Identifier() const { return instrument_.Identifier(); }
+    EventReader& Events() { return events_; }
+
+  private:
+    EventMailbox mailbox_;
     OpenedInstrument instrument_;
-    const Interruption::Deferral deferral_;
-    const std::uint64_t start_;
+    EventReader events_{mailbox_, instrument_};
 };
 
 }  // namespace Varnholt::Service

@@ -26,62 +26,60 @@ std::uint32_t NativePipeOf(const std::string& path) {
     return isPipe && last >= '1' && last <= '3' ? static_cast<std::uint32_t>(last - '0') : 0;
 }
 
-std::uint8_t EndpointOfNativePipe(std::uint32_t pipe) {
-    switch (pipe) {
-        case Protocol::NativeDriver::ReadPipe:
-            return Protocol::BulkInEndpoint;
-        case Protocol::NativeDriver::WritePipe:
-            return Protocol::BulkOutEndpoint;
-        default:
-            return Protocol::InterruptInEndpoint;
-    }
-}
-
 }  // namespace
 
 InterruptibleDeviceFiles::InterruptibleDeviceFiles(DeviceFileSystem& underlying) : below_(underlying) {}
 
-void InterruptibleDeviceFiles::Interrupt() {
+void InterruptibleDeviceFiles::Interrupt(const std::string& device) {
     const std::lock_guard holder(section_);
-    interrupted_ = true;
-    std::vector<Handle> busy;
-    for (const RunningTransfer& transfer : running_) {
-        if (std::find(busy.begin(), busy.end(), transfer.file) == busy.end()) {
-            busy.push_back(transfer.file);
+    interrupted_.push_back(device);
+    for (const OpenedFile& file : files_) {
+        const bool isBusy =
+            std::ranges::find(running_, file.handle, &RunningTransfer::file) != running_.end();
+        if (isBusy && IsInterrupted(file.handle)) {
+            AbortPipe(file);
         }
     }
-    for (const Handle file : busy) {
-        AbortPipe(file);
+}
+
+void InterruptibleDeviceFiles::Resume(const std::string& device) {
+    const std::lock_guard holder(section_);
+    std::erase(interrupted_, device);
+}
+
+InterruptibleDeviceFiles::OpenedFile* InterruptibleDeviceFiles::Find(Handle file) {
+    const auto found = std::ranges::find(files_, file, &OpenedFile::handle);
+    return found == files_.end() ? nullptr : &*found;
+}
+
+bool InterruptibleDeviceFiles::IsInterrupted(Handle file) {
+    if (interrupted_.empty()) {
+        return false;
     }
+    const OpenedFile* const opened = Find(file);
+    return opened != nullptr && !opened->waitsForButton &&
+           std::ranges::any_of(interrupted_, [opened](const std::string& device) {
+               return device.empty() || opened->path == device ||
+                      opened->path.starts_with(device + Protocol::NativeDriver::PipeSuffix);
+           });
 }
 
-void InterruptibleDeviceFiles::Resume() {
-    interrupted_ = false;
-}
-
-const std::string& InterruptibleDeviceFiles::PathOf(Handle file) const {
-    static const std::string none;
-    const auto found = std::find_if(files_.begin(), files_.end(),
-                                    [file](const OpenedFile& opened) { return opened.handle == file; });
-    return found == files_.end() ? none : found->path;
-}
-
-void InterruptibleDeviceFiles::AbortPipe(Handle file) {
-    const std::string& path = PathOf(file);
-    const std::uint32_t pipe = NativePipeOf(path);
+void InterruptibleDeviceFiles::AbortPipe(const OpenedFile& file) {
+    const std::uint32_t pipe = NativePipeOf(file.path);
     if (pipe == 0) {
-        Control(file, Protocol::UsbIoDriver::Control::AbortPipe, nullptr, 0);
+        Control(file.handle, Protocol::UsbIoDriver::Control::AbortPipe, nullptr, 0);
         return;
     }
     const std::string device =
-        path.substr(0, path.size() - 1 - std::string(Protocol::NativeDriver::PipeSuffix).size());
-    const auto owner = std::find_if(files_.begin(), files_.end(),
-                                    [&device](const OpenedFile& opened) { return opened.path == device; });
+        file.path.substr(0, file.path.size() - 1 - std::string(Protocol::NativeDriver::PipeSuffix).size());
+    const auto owner = std::ranges::find(files_, device, &OpenedFile::path);
     if (owner == files_.end()) {
         return;
     }
     Protocol::NativeDriver::ControlBlock block{};
-    Protocol::StoreLittle16(&block[Protocol::NativeDriver::Block::Value], EndpointOfNativePipe(pipe));
+    Protocol::StoreLittle16(
+        &block[Protocol::NativeDriver::Block::Value],
+        pipe == Protocol::NativeDriver::ReadPipe ? Protocol::BulkInEndpoint : Protocol::BulkOutEndpoint);
     Control(owner->handle, Protocol::NativeDriver::ControlAbortPipe, block.data(),
             static_cast<std::uint32_t>(block.size()));
 }
@@ -118,7 +116,7 @@ Handle InterruptibleDeviceFiles::Open(const std::string& path) {
     }
     try {
         const std::lock_guard holder(section_);
-        files_.push_back({file, path});
+        files_.push_back({file, path, NativePipeOf(path) == Protocol::NativeDriver::InterruptPipe});
         return file;
     } catch (const std::bad_alloc&) {
         below_.CloseFile(file);
@@ -150,7 +148,7 @@ bool InterruptibleDeviceFiles::Refuse(Overlapped& record, ErrorCode code) {
 template <class Start>
 bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, Start start) try {
     const std::lock_guard holder(section_);
-    if (interrupted_) {
+    if (IsInterrupted(file)) {
         return Refuse(record, Errors::OperationAborted);
     }
     std::erase_if(running_,
@@ -180,9 +178,19 @@ bool InterruptibleDeviceFiles::StartWrite(Handle file, const void* buffer, std::
 bool InterruptibleDeviceFiles::StartControl(Handle file, std::uint32_t code, const void* input,
                                             std::uint32_t inputSize, void* output, std::uint32_t outputSize,
                                             Overlapped& record) {
-    // A control is short and has no pipe that could be aborted; it ends by itself.
-    return interrupted_ ? Refuse(record, Errors::OperationAborted)
-                        : below_.StartControl(file, code, input, inputSize, output, outputSize, record);
+    {
+        const std::lock_guard holder(section_);
+        // A control is short and has no pipe that could be aborted; it ends by itself.
+        if (IsInterrupted(file)) {
+            return Refuse(record, Errors::OperationAborted);
+        }
+        OpenedFile* const opened = Find(file);
+        if (opened != nullptr && code == Protocol::UsbIoDriver::Control::BindPipe && inputSize > 0) {
+            opened->waitsForButton =
+                *static_cast<const std::uint8_t*>(input) == Protocol::InterruptInEndpoint;
+        }
+    }
+    return below_.StartControl(file, code, input, inputSize, output, outputSize, record);
 }
 
 bool InterruptibleDeviceFiles::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred,

@@ -1,6 +1,5 @@
 #pragma once
 
-#include <atomic>
 #include <cstdint>
 #include <string>
 #include <vector>
@@ -28,13 +27,14 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
     InterruptibleDeviceFiles& operator=(const InterruptibleDeviceFiles&) = delete;
 
     /// Ends the reads and writes that run, and refuses new transfers and controls with
-    /// `Platform::Errors::OperationAborted` until `Resume`. The event of what is refused is signalled: the
-    /// instrument's own driver has callers that wait for it although nothing was started. Returns within 2 s
-    /// for each pipe. Any thread.
-    void Interrupt();
-    /// Transfers may start again.
-    void Resume();
-    bool IsInterrupted() const { return interrupted_.load(); }
+    /// `Platform::Errors::OperationAborted` until `Resume`: on the files of the device with this identifier,
+    /// or of all devices when it is empty. What waits for the button goes on: an aborted interrupt pipe would
+    /// look like an instrument that is gone. The event of what is refused is signalled: the instrument's own
+    /// driver has callers that wait for it although nothing was started. Returns within 2 s for each pipe.
+    /// Any thread.
+    void Interrupt(const std::string& device);
+    /// Transfers may start again on the files of that device; with none, after an interruption of all.
+    void Resume(const std::string& device);
 
     bool LoadEnumeration() override { return below_.LoadEnumeration(); }
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
@@ -51,6 +51,7 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
     struct OpenedFile {
         Handle handle;
         std::string path;
+        bool waitsForButton;  ///< the interrupt pipe's
     };
     struct RunningTransfer {
         const Overlapped* record;
@@ -60,14 +61,15 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
     template <class Start>
     bool StartTransfer(Handle file, Overlapped& record, Start start);
     static bool Refuse(Overlapped& record, Platform::ErrorCode code);
-    void AbortPipe(Handle file);
+    void AbortPipe(const OpenedFile& file);
     void Control(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize);
-    const std::string& PathOf(Handle file) const;
+    OpenedFile* Find(Handle file);
+    bool IsInterrupted(Handle file);
 
     Platform::DeviceFileSystem& below_;
-    std::atomic<bool> interrupted_{false};
     /// Guards what follows, and keeps files from being closed while their pipes are aborted.
     Platform::RecursiveMutex section_;
+    std::vector<std::string> interrupted_;  ///< devices; an empty one: all
     std::vector<OpenedFile> files_;
     std::vector<RunningTransfer> running_;
 };

@@ -18,6 +18,11 @@ void Interruption::Request() {
     }
 }
 
+void Interruption::Withdraw() {
+    requested_ = false;
+    Platform::Wait(event_.Get(), 0);
+}
+
 bool Interruption::Sleep(std::uint32_t milliseconds) const {
     if (!requested_ && milliseconds > 0) {
         Platform::Wait(event_.Get(), milliseconds);

@@ -19,6 +19,8 @@ class Interruption final {
 
     void Request();
     bool IsRequested() const { return requested_.load(); }
+    /// What was asked to end has ended: what comes next goes on until the next request.
+    void Withdraw();
 
     /// Waits; false at once when the end is wanted.
     bool Sleep(std::uint32_t milliseconds) const;

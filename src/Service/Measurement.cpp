@@ -32,6 +32,10 @@ void SetIntegrationTime(const Commands& commands, double seconds) {
 
 void PrepareMeasurement(OpenedInstrument& instrument, const MeasurementSettings& settings) {
     instrument.UsedContext().Sleep(Fixed::WaitAfterOpening);
+    SetMeasurement(instrument, settings);
+}
+
+void SetMeasurement(OpenedInstrument& instrument, const MeasurementSettings& settings) {
     instrument.Do([&settings](const Commands& commands) {
         if (settings.integrationTime > 0) {
             SetIntegrationTime(commands, settings.integrationTime);

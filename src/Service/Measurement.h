@@ -23,9 +23,10 @@ struct MeasurementSettings {
     MeasurementParameters parameters;
 };
 
-/// Gives the instrument the time that it needs after its reset and sets its measurement parameters; an
-/// integration time chooses the measurement mode as well.
+/// Gives the instrument the time that it needs after its reset and sets its measurement parameters.
 void PrepareMeasurement(OpenedInstrument& instrument, const MeasurementSettings& settings);
+/// The second half of it; an integration time chooses the measurement mode as well.
+void SetMeasurement(OpenedInstrument& instrument, const MeasurementSettings& settings);
 
 /// What a measurement is taken with.
 struct MeasurementFacts {

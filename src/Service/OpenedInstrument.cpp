@@ -20,7 +20,7 @@ OpenedInstrument::OpenedInstrument(Context& usedContext, const FoundInstrument& 
             commands_ = Commands(new CommandSet(transport_));
         }
     } catch (...) {
-        context_.Files().Resume();
+        context_.Resume();
         context_.UserInterruption().ThrowIfRequested();
         const Failure failure = Describe(std::current_exception());
         const bool isTaken = failure.Kind() == FailureKind::InUse ||
@@ -40,7 +40,7 @@ OpenedInstrument::OpenedInstrument(Context& usedContext, const FoundInstrument& 
 
 OpenedInstrument::~OpenedInstrument() {
     // After an interruption too: closing waits for answers to what it sends.
-    context_.Files().Resume();
+    context_.Resume();
     try {
         if (messageListener_ != nullptr) {
             transport_->RemoveListener(messageListener_);

@@ -11,7 +11,7 @@ using Commands = OpenedInstrument::Commands;
 
 /// An instrument whose scan was cut off would go on streaming.
 void EndStream(OpenedInstrument& instrument) {
-    instrument.UsedContext().Files().Resume();
+    instrument.UsedContext().Resume();
     try {
         instrument.Reset(Protocol::OpeningResetCode);
     } catch (...) {  // what ended the scan is what counts, and the next opening resets the instrument
