@@ -58,6 +58,16 @@ SimulatedInstrument& SimulatedBus::Instrument(const std::string& name) {
     return *instruments_.at(name);
 }
 
+void SimulatedBus::Remove(const std::string& name) {
+    Unplug(name);
+    std::shared_ptr<SimulatedInstrument>
+        removed;  // declared first: its end, which waits for its events, is outside the lock
+    const std::lock_guard lock(mutex_);
+    faults_.erase(name);
+    removed = std::move(instruments_.at(name));
+    instruments_.erase(name);
+}
+
 std::shared_ptr<FaultScript> SimulatedBus::SetFaults(const std::string& name, FaultPlan plan) {
     auto script = std::make_shared<FaultScript>(std::move(plan));
     const std::lock_guard lock(mutex_);

@@ -30,6 +30,9 @@ class SimulatedBus final : public Platform::Usb::UsbBus {
     /// The instrument of that name, plugged in or not; it must have been added.
     SimulatedInstrument& Instrument(const std::string& name);
 
+    /// Takes it off the bus for good; what was opened before stays without a device.
+    void Remove(const std::string& name);
+
     /// What was opened before stays without a device, also after the instrument is back.
     void Unplug(const std::string& name) { Instrument(name).Unplug(); }
     void PlugIn(const std::string& name) { Instrument(name).PlugIn(); }

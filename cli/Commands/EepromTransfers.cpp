@@ -51,12 +51,7 @@ struct WriteOptions {
 
 /// Refuses an image that the driver cannot use, unless that is wanted.
 void CheckBeforeWriting(Session& session, const WriteOptions& options, const EepromImage& image) {
-    std::string errors;
-    for (const ImageFinding& finding : CheckImage(image)) {
-        if (finding.severity == ImageFinding::Severity::Error) {
-            errors += (errors.empty() ? "" : "; ") + finding.area + ": " + finding.text;
-        }
-    }
+    const std::string errors = ErrorsOf(CheckImage(image));
     if (errors.empty()) {
         return;
     }

@@ -14,9 +14,9 @@
 #include "Interface/HostCall.h"
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFileSystem.h"
-#include "Platform/EventScheduler.h"
 #include "Platform/SystemInterfaces.h"
 #include "Platform/Usb/SimulatorBus.h"
+#include "SchedulerInForce.h"
 #include "SimulatedBus.h"
 #include "SimulatedSetup.h"
 #include "Utilities/Exceptions/Exceptions.h"
@@ -29,16 +29,6 @@ namespace Varnholt::Simulator {
 namespace {
 
 constexpr const char* Variable = "OSTRA_SIMULATED";
-
-/// Follows the clock, which changes with each call where time is virtual.
-class SchedulerInForce final : public Platform::EventScheduler {
-  public:
-    std::uint64_t Now() override { return Platform::ClockScheduler().Now(); }
-    EventId CallAt(std::uint64_t time, std::function<void()> event) override {
-        return Platform::ClockScheduler().CallAt(time, std::move(event));
-    }
-    void Forget(EventId id) override { Platform::ClockScheduler().Forget(id); }
-};
 
 SimulatedSetup ReadSetup() {
     const char* const value = std::getenv(Variable);

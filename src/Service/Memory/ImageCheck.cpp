@@ -320,6 +320,16 @@ bool IsSane(const std::vector<ImageFinding>& findings) {
                         [](const ImageFinding& finding) { return finding.severity == Severity::Error; });
 }
 
+std::string ErrorsOf(const std::vector<ImageFinding>& findings) {
+    std::string errors;
+    for (const ImageFinding& finding : findings) {
+        if (finding.severity == Severity::Error) {
+            errors += (errors.empty() ? "" : "; ") + finding.area + ": " + finding.text;
+        }
+    }
+    return errors;
+}
+
 const char* NameOf(ImageFinding::Severity severity) {
     switch (severity) {
         case Severity::Fine:

@@ -27,6 +27,9 @@ std::vector<ImageFinding> CheckImage(const EepromImage& image);
 /// Nothing in it is an error.
 bool IsSane(const std::vector<ImageFinding>& findings);
 
+/// The errors alone, in a line; empty where there are none.
+std::string ErrorsOf(const std::vector<ImageFinding>& findings);
+
 /// "ok", "note", "warning", "error"
 const char* NameOf(ImageFinding::Severity severity);
 
