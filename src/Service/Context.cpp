@@ -70,7 +70,8 @@ Failure Context::Explain(const std::exception_ptr& exception, const std::string&
     if (identifier.empty()) {
         return failure;
     }
-    if (failure.IsOfTransfer() && !IsConnected(*this, identifier)) {
+    const bool canBeUnplugged = failure.IsOfTransfer() || failure.Kind() == FailureKind::Timeout;
+    if (canBeUnplugged && !IsConnected(*this, identifier)) {
         return Failure(FailureKind::Unplugged, "unplugged (" + failure.Message() + ")",
                        "plug it in again; `ostra list` shows whether it is found", failure.DriverText())
             .Of(identifier);
