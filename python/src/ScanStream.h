@@ -1,0 +1,63 @@
+#pragma once
+
+#include <pybind11/numpy.h>
+#include <pybind11/pybind11.h>
+
+#include <exception>
+#include <memory>
+#include <mutex>
+#include <vector>
+
+#include "Instrument.h"
+#include "Platform/Handle.h"
+#include "Platform/WaitableObjects.h"
+#include "Service/ScanRun.h"
+
+namespace Varnholt::Python {
+
+/// A scan that runs on a thread of its own, and the records that have come and were not taken yet: a few MiB
+/// at most, then the instrument waits. One thread takes them; any may close it.
+class ScanStream final : private Service::RecordSink {
+  public:
+    /// While it is the calling thread's turn with the instrument.
+    ScanStream(std::shared_ptr<Instrument> instrument, const Service::ScanSettings& settings);
+    ~ScanStream() override;
+    ScanStream(const ScanStream&) = delete;
+    ScanStream& operator=(const ScanStream&) = delete;
+
+    /// All records that have come, at least one: values of shape (n, record size / 2), or bytes of shape
+    /// (n, record size). None at the end. Raises what ended the scan, once, when the records are out.
+    py::object Next(bool asBytes);
+    /// Ends the scan, which resets the instrument, and drops what was not taken. Harmless afterwards.
+    void Close();
+
+    bool IsRunning();
+    std::uint64_t Received() const { return report_.received; }  ///< bytes; once it has ended
+    double Seconds() const { return static_cast<double>(milliseconds_) / 1000; }
+    py::bytes LeftOver() const;
+
+  private:
+    void TakeRecords(std::span<const std::uint8_t> records, std::uint64_t milliseconds) override;
+    void Run();
+    bool AwaitData();
+    void Join(bool mustInterrupt);
+    py::object ArrayOf(const std::vector<std::uint8_t>& bytes, bool asBytes) const;
+
+    const std::shared_ptr<Instrument> instrument_;
+    const Service::ScanSettings settings_;
+    Service::ScanReport report_;
+    const Platform::OwnedHandle filled_{Platform::MakeAutoResetEvent()};
+    const Platform::OwnedHandle drained_{Platform::MakeAutoResetEvent()};
+    Platform::RecursiveMutex section_;  ///< guards what follows
+    std::vector<std::uint8_t> waiting_;
+    std::uint64_t waitingSince_ = 0;  ///< milliseconds of the scan when the last of them came
+    std::exception_ptr failure_;
+    bool isFailed_ = false;
+    bool hasEnded_ = false;
+    bool mustEnd_ = false;
+    std::uint64_t milliseconds_ = 0;  ///< of the records taken last
+    std::mutex joining_;
+    Platform::OwnedHandle thread_;
+};
+
+}  // namespace Varnholt::Python
