@@ -60,8 +60,7 @@ SimulatedInstrument& SimulatedBus::Instrument(const std::string& name) {
 
 void SimulatedBus::Remove(const std::string& name) {
     Unplug(name);
-    std::shared_ptr<SimulatedInstrument>
-        removed;  // declared first: its end, which waits for its events, is outside the lock
+    std::shared_ptr<SimulatedInstrument> removed;  // ends outside the lock: that waits for its events
     const std::lock_guard lock(mutex_);
     faults_.erase(name);
     removed = std::move(instruments_.at(name));

@@ -1,0 +1,68 @@
+// What the C++ core does in the same time as the Python package: readouts and a scan on a simulated instrument in this
+// process. usage: core_rates native|usbio READOUTS RECORDS BYTES_PER_SECOND; prints seconds a readout, bytes a second.
+// Run in turns with the package by python_rates.py.
+#include <chrono>
+#include <cstdlib>
+#include <iostream>
+#include <string>
+
+#include "BenchHost.h"
+#include "Service/Instruments.h"
+#include "Service/Measurement.h"
+#include "Service/ScanRun.h"
+
+namespace {
+
+using namespace Varnholt;
+using Clock = std::chrono::steady_clock;
+
+double SecondsSince(Clock::time_point start) {
+    return std::chrono::duration<double>(Clock::now() - start).count();
+}
+
+/// Looks at each record, as whoever wants it would.
+class Summing final : public Service::RecordSink {
+  public:
+    void TakeRecords(std::span<const std::uint8_t> records, std::uint64_t) override {
+        for (const std::uint8_t byte : records) {
+            sum += byte;
+        }
+    }
+    std::uint64_t sum = 0;
+};
+
+}  // namespace
+
+int main(int count, char** arguments) {
+    if (count != 5) {
+        return 2;
+    }
+    const bool isUsbIo = std::string(arguments[1]) == "usbio";
+    const auto number = [&](int i) { return std::strtoull(arguments[i], nullptr, 10); };
+    Simulator::InstrumentSettings settings;
+    settings.scanBytes = number(3) * Protocol::ReadoutBytes;
+    settings.bytesPerSecond = number(4);
+    Bench::BenchHost host(isUsbIo, settings);
+
+    Service::Observer observer;
+    Service::Interruption interruption;
+    Service::Context context(observer, interruption);
+    context.ChooseTransport(isUsbIo ? Service::Context::Transport::UsbIo : Service::Context::Transport::Native);
+    Service::OpenedInstrument instrument(context, FindInstrument(context, {}));
+    PrepareMeasurement(instrument, {});
+
+    auto start = Clock::now();
+    std::int32_t last = 0;
+    for (std::uint64_t i = 0; i < number(2); ++i) {
+        last += TakeReadout(instrument).Values()[64];
+    }
+    std::cout << SecondsSince(start) / static_cast<double>(number(2));
+
+    Summing sink;
+    Service::ScanReport report;
+    const auto total = static_cast<std::uint32_t>(settings.scanBytes);
+    start = Clock::now();
+    RunScan(instrument, {Protocol::ReadoutBytes, total, 5}, sink, report);
+    std::cout << ' ' << static_cast<double>(total) / SecondsSince(start) << '\n';
+    return last == 0 && sink.sum == 0 ? 1 : 0;
+}
