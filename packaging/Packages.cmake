@@ -14,6 +14,9 @@ set(CPACK_COMPONENTS_ALL library development tools)
 if(WIN32)
   list(APPEND CPACK_COMPONENTS_ALL symbols)
 endif()
+if(OSTRA_PYTHON)
+  list(APPEND CPACK_COMPONENTS_ALL python)
+endif()
 set(CPACK_DEB_COMPONENT_INSTALL ON)
 set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
 set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
@@ -39,6 +42,16 @@ set(CPACK_DEBIAN_TOOLS_DESCRIPTION "command line of a hand-held optical measurin
  Lists instruments, takes readouts and scans, backs up, checks and writes
  EEPROM images. Comes with a simulated instrument for work without hardware.")
 set(CPACK_DEBIAN_TOOLS_PACKAGE_CONTROL_EXTRA "${CMAKE_CURRENT_SOURCE_DIR}/debian/postrm")
+# The extension module fits one Python only.
+set(CPACK_DEBIAN_PYTHON_PACKAGE_NAME python3-ostra)
+set(CPACK_DEBIAN_PYTHON_PACKAGE_SECTION python)
+math(EXPR OSTRA_NEXT_PYTHON "0${Python_VERSION_MINOR} + 1")
+set(CPACK_DEBIAN_PYTHON_PACKAGE_DEPENDS
+  "python3 (>= 3.${Python_VERSION_MINOR}), python3 (<< 3.${OSTRA_NEXT_PYTHON}), python3-numpy")
+set(CPACK_DEBIAN_PYTHON_PACKAGE_SUGGESTS python3-matplotlib)
+set(CPACK_DEBIAN_PYTHON_DESCRIPTION "hand-held optical measuring instrument in Python
+ Takes readouts and scans as numpy arrays, works on EEPROM images, and brings
+ simulated instruments for everybody's own tests.")
 # Debian has symbols in packages of their own; to make them CPack takes what they hold from the files and strips those.
 set(CPACK_DEBIAN_DEBUGINFO_PACKAGE ${OSTRA_DEBIAN})
 if(OSTRA_DEBIAN OR WIN32)
@@ -53,7 +66,11 @@ if(OSTRA_DEBIAN)
   string(TIMESTAMP OSTRA_DATE "%a, %d %b %Y %H:%M:%S +0000" UTC)
   configure_file(debian/changelog.in "${CMAKE_CURRENT_BINARY_DIR}/changelog" @ONLY)
   execute_process(COMMAND gzip -9nkf changelog WORKING_DIRECTORY "${CMAKE_CURRENT_BINARY_DIR}" COMMAND_ERROR_IS_FATAL ANY)
-  foreach(COMPONENT IN ITEMS LIBRARY DEVELOPMENT TOOLS)
+  set(OSTRA_DEBIAN_COMPONENTS LIBRARY DEVELOPMENT TOOLS)
+  if(OSTRA_PYTHON)
+    list(APPEND OSTRA_DEBIAN_COMPONENTS PYTHON)
+  endif()
+  foreach(COMPONENT IN LISTS OSTRA_DEBIAN_COMPONENTS)
     string(TOLOWER ${COMPONENT} OSTRA_COMPONENT)
     install(FILES "${CMAKE_CURRENT_BINARY_DIR}/changelog.gz" debian/copyright
       DESTINATION "${CMAKE_INSTALL_DATADIR}/doc/${CPACK_DEBIAN_${COMPONENT}_PACKAGE_NAME}" COMPONENT ${OSTRA_COMPONENT})
