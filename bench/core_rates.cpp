@@ -1,12 +1,15 @@
-// What the C++ core does in the same time as the Python package: readouts and a scan on a simulated instrument in this
-// process. usage: core_rates native|usbio READOUTS RECORDS BYTES_PER_SECOND; prints seconds a readout, bytes a second.
-// Run in turns with the package by python_rates.py.
+// What the C++ core does in the same time as the Python package: readouts and a scan on a simulated
+// instrument in this process. usage: core_rates native|usbio READOUTS RECORDS BYTES_PER_SECOND; prints
+// seconds a readout, bytes a second. Run in turns with the package by python_rates.py.
 #include <chrono>
 #include <cstdlib>
 #include <iostream>
+#include <numeric>
 #include <string>
+#include <vector>
 
 #include "BenchHost.h"
+#include "Protocol/ByteOrder.h"
 #include "Service/Instruments.h"
 #include "Service/Measurement.h"
 #include "Service/ScanRun.h"
@@ -20,15 +23,18 @@ double SecondsSince(Clock::time_point start) {
     return std::chrono::duration<double>(Clock::now() - start).count();
 }
 
-/// Looks at each record, as whoever wants it would.
+/// Makes values of the records and adds them up, as the package and the other side of the comparison do.
 class Summing final : public Service::RecordSink {
   public:
     void TakeRecords(std::span<const std::uint8_t> records, std::uint64_t) override {
-        for (const std::uint8_t byte : records) {
-            sum += byte;
+        values.resize(records.size() / 2);
+        for (std::size_t i = 0; i < values.size(); ++i) {
+            values[i] = Interface::ReadingOf(Protocol::LoadBig16(&records[2 * i]));
         }
+        sum = std::accumulate(values.begin(), values.end(), sum);
     }
-    std::uint64_t sum = 0;
+    std::vector<std::int32_t> values;
+    std::int64_t sum = 0;
 };
 
 }  // namespace
@@ -47,7 +53,8 @@ int main(int count, char** arguments) {
     Service::Observer observer;
     Service::Interruption interruption;
     Service::Context context(observer, interruption);
-    context.ChooseTransport(isUsbIo ? Service::Context::Transport::UsbIo : Service::Context::Transport::Native);
+    context.ChooseTransport(isUsbIo ? Service::Context::Transport::UsbIo
+                                    : Service::Context::Transport::Native);
     Service::OpenedInstrument instrument(context, FindInstrument(context, {}));
     PrepareMeasurement(instrument, {});
 
