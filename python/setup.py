@@ -14,8 +14,7 @@ ROOT = Path(__file__).resolve().parent.parent
 
 class BuildWithCMake(build_ext):
     def build_extension(self, extension):
-        build = Path(self.build_temp).resolve()
-        build.mkdir(parents=True, exist_ok=True)
+        build = ROOT / "build" / "wheel"
         options = [
             "-DCMAKE_BUILD_TYPE=Release",
             "-DCMAKE_UNITY_BUILD=ON",
@@ -23,6 +22,7 @@ class BuildWithCMake(build_ext):
             "-DOSTRA_TESTS=OFF",
             "-DOSTRA_TOOLS=OFF",
             "-DOSTRA_INSTALL=OFF",
+            "-DOSTRA_SYMBOLS=ON",  # a compiler cache then has most objects from quickstart; stripped below
             "-DOSTRA_FMT_HEADERS=ON",  # nothing but libusb, libudev and the system's own is needed where it runs
             f"-DPython_EXECUTABLE={sys.executable}",
         ]
