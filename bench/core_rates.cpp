@@ -3,6 +3,7 @@
 // seconds a readout, bytes a second. Run in turns with the package by python_rates.py.
 #include <chrono>
 #include <cstdlib>
+#include <ctime>
 #include <iostream>
 #include <numeric>
 #include <string>
@@ -59,11 +60,14 @@ int main(int count, char** arguments) {
     PrepareMeasurement(instrument, {});
 
     auto start = Clock::now();
+    const std::clock_t startClock = std::clock();
     std::int32_t last = 0;
     for (std::uint64_t i = 0; i < number(2); ++i) {
         last += TakeReadout(instrument).Values()[64];
     }
-    std::cout << SecondsSince(start) / static_cast<double>(number(2));
+    const auto readouts = static_cast<double>(number(2));
+    std::cout << SecondsSince(start) / readouts << ' '
+              << static_cast<double>(std::clock() - startClock) / CLOCKS_PER_SEC / readouts;
 
     Summing sink;
     Service::ScanReport report;

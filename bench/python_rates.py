@@ -19,13 +19,14 @@ def core(transport, records, rate):
 def package(transport, records, rate):
     with ostra.simulated(scan_bytes=records * 256, rate=rate) as lab, ostra.open(lab, transport) as instrument:
         instrument.readout()
-        begun = time.perf_counter()
+        begun, worked = time.perf_counter(), time.process_time()
         total = sum(int(readout.values[64]) for readout in instrument.readouts(READOUTS))
         readout = (time.perf_counter() - begun) / READOUTS
+        work = (time.process_time() - worked) / READOUTS
         begun = time.perf_counter()
         total += sum(int(block.sum()) for block in instrument.scan(records=records))
         assert total != 0
-        return readout, records * 256 / (time.perf_counter() - begun)
+        return readout, work, records * 256 / (time.perf_counter() - begun)
 
 
 for transport in ("native", "usbio"):
@@ -34,11 +35,12 @@ for transport in ("native", "usbio"):
         for _ in range(ROUNDS):
             for side in (core, package):
                 figures[side].append(tuple(side(transport, records, rate)))
-        (core_readout, core_rate), (readout, speed) = (
+        (core_readout, core_work, core_rate), (readout, work, speed) = (
             map(statistics.median, zip(*figures[side])) for side in (core, package)
         )
         print(
             f"{transport:6} {'at USB speed' if rate else 'unlimited':12}  readouts/s of the core's: "
-            f"{core_readout / readout:.2f}  us beyond it: {(readout - core_readout) * 1e6:.1f}  "
+            f"{core_readout / readout:.2f}  us beyond it: {(readout - core_readout) * 1e6:.1f}, "
+            f"{(work - core_work) * 1e6:.1f} of processor time  "
             f"scan of the core's: {speed / core_rate:.2f} ({speed / 1e6:.0f} MB/s)"
         )

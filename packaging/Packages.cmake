@@ -42,12 +42,15 @@ set(CPACK_DEBIAN_TOOLS_DESCRIPTION "command line of a hand-held optical measurin
  Lists instruments, takes readouts and scans, backs up, checks and writes
  EEPROM images. Comes with a simulated instrument for work without hardware.")
 set(CPACK_DEBIAN_TOOLS_PACKAGE_CONTROL_EXTRA "${CMAKE_CURRENT_SOURCE_DIR}/debian/postrm")
-# The extension module fits one Python only.
 set(CPACK_DEBIAN_PYTHON_PACKAGE_NAME python3-ostra)
 set(CPACK_DEBIAN_PYTHON_PACKAGE_SECTION python)
-math(EXPR OSTRA_NEXT_PYTHON "0${Python_VERSION_MINOR} + 1")
-set(CPACK_DEBIAN_PYTHON_PACKAGE_DEPENDS
-  "python3 (>= 3.${Python_VERSION_MINOR}), python3 (<< 3.${OSTRA_NEXT_PYTHON}), python3-numpy")
+if(OSTRA_PYTHON)
+  # The extension module fits one Python only.
+  find_package(Python REQUIRED COMPONENTS Interpreter)
+  math(EXPR OSTRA_NEXT_PYTHON "${Python_VERSION_MINOR} + 1")
+  set(CPACK_DEBIAN_PYTHON_PACKAGE_DEPENDS
+    "python3 (>= 3.${Python_VERSION_MINOR}), python3 (<< 3.${OSTRA_NEXT_PYTHON}), python3-numpy")
+endif()
 set(CPACK_DEBIAN_PYTHON_PACKAGE_SUGGESTS python3-matplotlib)
 set(CPACK_DEBIAN_PYTHON_DESCRIPTION "hand-held optical measuring instrument in Python
  Takes readouts and scans as numpy arrays, works on EEPROM images, and brings

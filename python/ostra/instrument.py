@@ -170,8 +170,8 @@ class Scan:
 
     Each step answers all records that have come since the last one, at least one: int32, shape (n, record_size
     / 2), in the order and with the signs of the wire (unlike in a readout, the first and the last value are as
-    they came); with ``raw`` uint8, shape (n, record_size). The scan runs on a thread of its own; when 4 MiB
-    wait, the instrument does. Records that came before a failure are handed out before it is raised.
+    they came); with ``raw`` uint8, shape (n, record_size). The scan runs on a thread of its own; when 1 MiB
+    waits, the instrument does. Records that came before a failure are handed out before it is raised.
 
     Until it is at its end, the instrument can do nothing else. Ctrl-C, :meth:`close`, leaving the ``with``
     block and the end of the object's life end the scan and reset the instrument.
@@ -358,7 +358,9 @@ _open: weakref.WeakSet[Instrument] = weakref.WeakSet()
 @atexit.register
 def _close_all() -> None:
     for instrument in list(_open):
-        instrument.close()
+        with contextlib.suppress(Error):
+            instrument.close()
+    _core.wait_for_threads(10.0)  # what they did for others has ended, but those must have noticed
 
 
 class Instrument:
@@ -377,9 +379,10 @@ class Instrument:
     def __init__(self, name: str = "", transport: Transport | None = None) -> None:
         way = transport or _core.default_transport()
         self._core = _core.Instrument(name, way)
+        self._identifier = self._core.identifier
         self._transport = way
         self._wanted: tuple[float, Parameters | None] = (0.0, None)
-        self._prepared: tuple[int, tuple[float, Parameters | None]] | None = None
+        self._prepared_after = -1  # resets; what was set before one is gone
         self._parameters = Parameters()
         self._integration_time = 0.0
         _open.add(self)
@@ -387,7 +390,7 @@ class Instrument:
     @property
     def identifier(self) -> str:
         """What the driver calls it."""
-        return self._core.identifier
+        return self._identifier
 
     @property
     def name(self) -> str:
@@ -420,7 +423,7 @@ class Instrument:
     def reset(self, code: int = 31) -> None:
         """Resets the instrument; the low byte of ``code`` is sent. Opening sends 31."""
         self._core.reset(code)
-        self._prepared = None
+        self._prepared_after = -1
 
     @property
     def mode(self) -> int:
@@ -430,7 +433,7 @@ class Instrument:
     @mode.setter
     def mode(self, mode: int) -> None:
         self._core.set_mode(mode)
-        self._prepared = None
+        self._prepared_after = -1
 
     @property
     def eeprom(self) -> Eeprom:
@@ -445,11 +448,11 @@ class Instrument:
     def _prepare(self, integration_time: float | None, parameters: Parameters | Iterable[int] | None) -> None:
         if integration_time is not None or parameters is not None:
             self.set_measurement(integration_time, parameters)
-        if self._prepared != (self._core.resets(), self._wanted):
+        if self._prepared_after != self._core.resets():
             seconds, chosen = self._wanted
             sent, self._integration_time = self._core.prepare(seconds, tuple(chosen) if chosen else None)
             self._parameters = Parameters(*sent)
-            self._prepared = (self._core.resets(), self._wanted)
+            self._prepared_after = self._core.resets()
 
     def set_measurement(
         self, integration_time: float | None = None, parameters: Parameters | Iterable[int] | None = None
@@ -472,7 +475,10 @@ class Instrument:
             for value, limit in zip(chosen, (0xFFFF, 0xFFFF, 0xFFFF, 0xFF)):
                 if not 0 <= value <= limit:
                     raise BadArgument(f"{tuple(chosen)}: three numbers up to 65535 and one up to 255 are wanted")
-        self._wanted = (integration_time or 0.0, chosen)
+        wanted = (integration_time or 0.0, chosen)
+        if wanted != self._wanted:
+            self._wanted = wanted
+            self._prepared_after = -1
 
     def readout(
         self,
@@ -491,9 +497,7 @@ class Instrument:
         """
         self._prepare(integration_time, parameters)
         seconds, milliseconds, values = self._core.readout()
-        return Readout(
-            values, seconds, milliseconds, self._parameters, self._integration_time, self._core.identifier
-        )
+        return Readout(values, seconds, milliseconds, self._parameters, self._integration_time, self._identifier)
 
     def readouts(
         self,

@@ -26,7 +26,7 @@ Instrument::Turn::Turn(Instrument& instrument, bool withScan) : lock_(instrument
     Host::Instance().CheckUsable();
     while (!lock_.try_lock()) {
         {
-            const py::gil_scoped_release released;
+            const Away away;
             if (lock_.try_lock_for(LookForSignals)) {
                 break;
             }
@@ -51,7 +51,7 @@ Instrument::Instrument(const std::string& identifier, Transport transport)
     std::optional<Failure> interrupted;
     {
         const InterruptGuard guard(interruption_);
-        const py::gil_scoped_release released;
+        const Away away;
         try {
             opened_.emplace(context_, FindInstrument(context_, identifier), &mailbox_);
             openedAt_ = Platform::TickCount();
@@ -77,7 +77,7 @@ void Instrument::Close() {
     if (closing_.exchange(true)) {
         return;
     }
-    const LockGivenUp released;
+    const AwayIfHere away;
     if (const auto scan = scan_.lock()) {
         scan->Close();
     }
@@ -88,6 +88,7 @@ void Instrument::Close() {
     }
     for (const auto& weak : events_) {
         if (const auto stream = weak.lock()) {
+            stream->mustEnd_ = true;
             const std::lock_guard held(stream->mutex_);
             stream->reader_.reset();
         }
@@ -101,7 +102,7 @@ void Instrument::RecoverAndRaise() {
         throw Closed(identifier_);
     }
     {
-        const py::gil_scoped_release released;
+        const Away away;
         // What the instrument was about to send would be taken for the answer to the next command.
         context_.Resume();
         interruption_.Withdraw();
@@ -172,7 +173,7 @@ EventStream::EventStream(std::shared_ptr<Instrument> instrument) {
 }
 
 bool EventStream::IsOpen() {
-    const py::gil_scoped_release released;
+    const Away away;
     const std::lock_guard held(mutex_);
     return reader_.has_value();
 }
@@ -182,9 +183,9 @@ py::object EventStream::Next(double timeout) {
     const double slice = static_cast<double>(LookForSignals.count()) / 1e3;
     std::optional<Service::InstrumentEvent> event;
     double end = -1;
-    for (;;) {
+    while (!mustEnd_) {
         {
-            const py::gil_scoped_release released;
+            const Away away;
             const std::lock_guard held(mutex_);
             if (!reader_) {
                 break;

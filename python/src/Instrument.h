@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "Away.h"
 #include "Host.h"
 #include "InterruptGuard.h"
 #include "Service/EventWatch.h"
@@ -36,20 +37,6 @@ template <class Object, class... Arguments>
 std::shared_ptr<Object> Make(Arguments&&... arguments) {
     return std::shared_ptr<Object>(new Object(std::forward<Arguments>(arguments)...), EndWhereUsable());
 }
-
-/// Gives up the interpreter's lock for its life, where this thread has it: the last reference to an object
-/// can go in either state.
-class LockGivenUp final {
-  public:
-    LockGivenUp() {
-        if (PyGILState_Check() != 0) {
-            released_.emplace();
-        }
-    }
-
-  private:
-    std::optional<py::gil_scoped_release> released_;
-};
 
 /// One opened instrument. Called with the interpreter's lock held, which is given up while the instrument
 /// works; several threads take turns.
@@ -80,7 +67,7 @@ class Instrument final : public std::enable_shared_from_this<Instrument> {
         const Turn turn(*this);
         try {
             const InterruptGuard guard(interruption_);
-            const py::gil_scoped_release released;
+            const Away away;
             return work(*opened_);
         } catch (const Service::Failure& failure) {
             if (failure.Kind() != Service::FailureKind::Interrupted) {
@@ -142,6 +129,8 @@ class EventStream final {
 
   private:
     friend class Instrument;
+    std::atomic<bool> mustEnd_{
+        false};         // said before the reader is taken: who waits for events locks again and again
     std::mutex mutex_;  // guards the reader
     std::optional<Service::EventReader> reader_;
 };

@@ -4,6 +4,9 @@
 #include <pybind11/pybind11.h>
 #include <pybind11/stl.h>
 
+#include <chrono>
+#include <thread>
+
 #include "Images.h"
 #include "Instrument.h"
 #include "ScanStream.h"
@@ -97,7 +100,7 @@ auto WithAllInstruments(const std::string& transport, Work work) {
     context.ChooseTransport(TransportOf(transport));
     try {
         const InterruptGuard guard(interruption);
-        const py::gil_scoped_release released;
+        const Away away;
         return work(context);
     } catch (const Failure& failure) {
         if (failure.Kind() != FailureKind::Interrupted) {
@@ -255,6 +258,13 @@ PYBIND11_MODULE(_core, module) {
     module.def("is_time_virtual", [] { return Host::Instance().IsTimeVirtual(); });
     module.def("start_capture", [](const std::string& file) { Host::Instance().StartCapture(file); });
     module.def("end_capture", [] { Host::Instance().EndCapture(); });
+    module.def("wait_for_threads", [](double seconds) {
+        const Away away;
+        constexpr std::uint32_t interval = 2;  // milliseconds
+        for (double waited = 0; Away::Count() > 1 && waited < seconds; waited += interval / 1e3) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(interval));
+        }
+    });
     module.def("parameter_meaning", MeaningOfParameter);
     module.def("save_file", [](const std::string& file, const py::bytes& content, bool replace) {
         using Utilities::Files::AtomicFile;

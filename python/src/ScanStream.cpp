@@ -13,7 +13,7 @@ using Service::FailureKind;
 
 namespace {
 
-constexpr std::size_t MostWaiting = std::size_t{4} << 20;  // bytes
+constexpr std::size_t MostWaiting = std::size_t{1} << 20;  // bytes
 constexpr std::uint32_t LookForSignals = 50;               // milliseconds
 
 }  // namespace
@@ -81,7 +81,7 @@ bool ScanStream::IsRunning() {
 
 /// False when a while has passed without any.
 bool ScanStream::AwaitData() {
-    const py::gil_scoped_release released;
+    const Away away;
     {
         const std::lock_guard held(section_);
         if (!waiting_.empty() || hasEnded_) {
@@ -104,20 +104,20 @@ py::object ScanStream::Next(bool asBytes) {
         Close();
         throw;
     }
-    std::vector<std::uint8_t> taken;
     std::exception_ptr failure;
+    taken_.clear();
     {
         const std::lock_guard held(section_);
-        taken.swap(waiting_);
+        taken_.swap(waiting_);
         Platform::SignalEvent(drained_.Get());
-        if (!taken.empty()) {
+        if (!taken_.empty()) {
             milliseconds_ = waitingSince_;
         } else {
             failure = std::exchange(failure_, nullptr);
         }
     }
-    if (!taken.empty()) {
-        return ArrayOf(taken, asBytes);
+    if (!taken_.empty()) {
+        return ArrayOf(taken_, asBytes);
     }
     Join(false);
     if (failure) {
@@ -136,7 +136,7 @@ py::object ScanStream::ArrayOf(const std::vector<std::uint8_t>& bytes, bool asBy
     }
     py::array_t<std::int32_t> array({records, size / 2});
     std::int32_t* const values = array.mutable_data();
-    const py::gil_scoped_release released;
+    const Away away;
     for (std::size_t i = 0; i < bytes.size() / 2; ++i) {
         values[i] = Interface::ReadingOf(Protocol::LoadBig16(&bytes[2 * i]));
     }
@@ -158,7 +158,7 @@ void ScanStream::Close() {
 
 /// Waits for the thread, and leaves the instrument to the next command.
 void ScanStream::Join(bool mustInterrupt) {
-    const LockGivenUp released;
+    const AwayIfHere away;
     const std::lock_guard held(joining_);
     if (!thread_) {
         return;

@@ -15,8 +15,8 @@
 
 namespace Varnholt::Python {
 
-/// A scan that runs on a thread of its own, and the records that have come and were not taken yet: a few MiB
-/// at most, then the instrument waits. One thread takes them; any may close it.
+/// A scan that runs on a thread of its own, and the records that have come and were not taken yet: a MiB or
+/// a little more, then the instrument waits. One thread takes them; any may close it.
 class ScanStream final : private Service::RecordSink {
   public:
     /// While it is the calling thread's turn with the instrument.
@@ -46,6 +46,7 @@ class ScanStream final : private Service::RecordSink {
     const std::shared_ptr<Instrument> instrument_;
     const Service::ScanSettings settings_;
     Service::ScanReport report_;
+    std::vector<std::uint8_t> taken_;  ///< the taker's; its memory serves again
     const Platform::OwnedHandle filled_{Platform::MakeAutoResetEvent()};
     const Platform::OwnedHandle drained_{Platform::MakeAutoResetEvent()};
     Platform::RecursiveMutex section_;  ///< guards what follows

@@ -53,7 +53,7 @@ void Simulation::Close() {
     }
     Host::Instance().CheckUsable();
     if (!std::exchange(isClosed_, true)) {
-        const LockGivenUp released;
+        const AwayIfHere away;
         Host::Instance().RemoveSimulated(name_);
     }
 }
@@ -68,13 +68,13 @@ Simulator::SimulatedInstrument& Simulation::Get() {
 
 void Simulation::PressButton() {
     Simulator::SimulatedInstrument& instrument = Get();
-    const py::gil_scoped_release released;
+    const Away away;
     instrument.PressButton();
 }
 
 void Simulation::Unplug() {
     Simulator::SimulatedInstrument& instrument = Get();
-    const py::gil_scoped_release released;
+    const Away away;
     instrument.Unplug();
 }
 
@@ -117,7 +117,7 @@ void AddSimulation(py::module_& module) {
     module.def("virtual_seconds", [] { return Host::Instance().VirtualSeconds(); });
     module.def("sleep", [](double seconds) {
         Host::Instance().CheckUsable();
-        const py::gil_scoped_release released;
+        const Away away;
         Platform::SleepMilliseconds(static_cast<std::uint32_t>(seconds * 1e3));
     });
 }
