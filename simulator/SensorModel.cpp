@@ -42,7 +42,7 @@ std::uint64_t Mix(std::uint64_t number) {
 
 /// About normally distributed around 0; the unit is 1/37837 of the standard deviation.
 std::int64_t Noise(std::uint64_t random) {
-    std::int64_t sum = -2 * 65535;
+    std::int64_t sum = std::int64_t{-2} * 65535;
     for (int i = 0; i < 4; ++i) {
         sum += static_cast<std::int64_t>(random >> (16 * i) & 0xFFFF);
     }
@@ -84,7 +84,7 @@ void SensorModel::Read(const Exposure& exposure, std::uint64_t measurement, std:
                                    SquareRoot(static_cast<std::uint64_t>(averages) * 256);
         const std::int64_t value = std::clamp(Offset + static_cast<std::int64_t>(brightness + dark) + noise,
                                               MostNegative, FullScale);
-        Protocol::StoreBig16(&bytes[2 * i], static_cast<std::uint16_t>(value));
+        Protocol::StoreBig16(&bytes[std::size_t{2} * i], static_cast<std::uint16_t>(value));
     }
     Protocol::StoreBig16(&bytes[Protocol::ReadoutBytes - 2], static_cast<std::uint16_t>(record));
 }

@@ -20,7 +20,7 @@ constexpr std::int64_t WallStart = 1'577'836'800;
 constexpr std::uint64_t CallsPerHandOver = 4;
 
 [[noreturn]] void Abort(const std::string& report) {
-    std::fprintf(stderr, "%s\n", report.c_str());
+    static_cast<void>(std::fprintf(stderr, "%s\n", report.c_str()));
     std::abort();
 }
 

@@ -7,7 +7,7 @@ namespace Varnholt::Interface {
 class HostCall final {
   public:
     HostCall();
-    ~HostCall();
+    ~HostCall();  // NOLINT(performance-trivially-destructible): not where instruments are simulated
     HostCall(const HostCall&) = delete;
     HostCall& operator=(const HostCall&) = delete;
 };

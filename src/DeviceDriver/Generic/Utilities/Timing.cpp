@@ -2,7 +2,7 @@
 
 namespace Varnholt::DeviceDriver::Generic::Utilities {
 
-Timing& Timing::operator=(const Timing&) {
+Timing& Timing::operator=(const Timing&) {  // NOLINT(misc-unconventional-assign-operator)
     return *this;
 }
 

@@ -26,7 +26,7 @@ class Timing {
     Timing(const Timing&) = default;
     virtual ~Timing() = default;
     /// There is nothing to assign; answers this object.
-    virtual Timing& operator=(const Timing& other);
+    virtual Timing& operator=(const Timing& other);  // NOLINT(misc-unconventional-assign-operator)
 
     /// Suspends the calling thread; 0 gives up the rest of its time slice.
     virtual void DeviceDriverSleep(std::uint32_t milliseconds) = 0;

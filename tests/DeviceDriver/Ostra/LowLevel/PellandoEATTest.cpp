@@ -74,6 +74,7 @@ TEST_F(FreshTable, IsTheOneOfAFreshInstrumentByteForByte) {
     EXPECT_EQ(EntriesOf(PellandoEAT(image.begin() + EepromMap::Table)), fresh_);
     ExpectThrow<ResourceException>("Configuration data dump target too small",
                                    [&] { table_.Dump(at(0), at(3)); });
+    EXPECT_NO_THROW(PellandoEAT().Dump(at(0), at(4))) << "a header alone";
 }
 
 TEST_F(FreshTable, SizeIsTheDistanceToTheNextEntry) {
