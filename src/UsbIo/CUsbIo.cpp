@@ -208,8 +208,8 @@ std::uint32_t CUsbIo::ClassOrVendorOutRequest(const void* buffer, std::uint32_t&
 
 char* CUsbIo::ErrorText(char* buffer, std::size_t size, std::uint32_t status) {
     if (buffer && size > 0) {
-        std::snprintf(buffer, size, "Error code 0x%08X: %s", static_cast<unsigned int>(status),
-                      StatusText(status));
+        static_cast<void>(std::snprintf(buffer, size, "Error code 0x%08X: %s",
+                                        static_cast<unsigned int>(status), StatusText(status)));
         buffer[size - 1] = '\0';
     }
     return buffer;

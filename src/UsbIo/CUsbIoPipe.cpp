@@ -8,8 +8,8 @@ namespace Varnholt::UsbIo {
 using namespace Protocol::UsbIoDriver;
 using Platform::WaitResult;
 
-std::uint32_t CUsbIoPipe::Bind(int deviceNumber, unsigned char endpointAddress, Platform::DeviceList list,
-                               const Protocol::Guid* interfaceGuid) {
+std::uint32_t CUsbIoPipe::Bind(int deviceNumber, unsigned char endpointAddress,
+                               const Platform::DeviceList& list, const Protocol::Guid* interfaceGuid) {
     if (!IsOpen()) {
         if (const std::uint32_t status = Open(deviceNumber, list, interfaceGuid)) {
             return status;

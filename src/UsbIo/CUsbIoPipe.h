@@ -10,7 +10,7 @@ namespace Varnholt::UsbIo {
 class CUsbIoPipe : public CUsbIo {
   public:
     /// Opens the device as `Open` does unless the object is open, then binds the handle to the endpoint.
-    std::uint32_t Bind(int deviceNumber, unsigned char endpointAddress, Platform::DeviceList list,
+    std::uint32_t Bind(int deviceNumber, unsigned char endpointAddress, const Platform::DeviceList& list,
                        const Protocol::Guid* interfaceGuid);
     /// Ends the transfers of this pipe, whatever thread started them.
     std::uint32_t AbortPipe();

@@ -63,7 +63,7 @@ void RecursiveMutex::Impl::LockCooperatively(ThreadRecord& me, Clock& clock) {
         }
         *link = call.next;
         if (call.hopeless) {
-            std::fprintf(stderr, "A mutex that is never unlocked cannot be locked.\n");
+            static_cast<void>(std::fputs("A mutex that is never unlocked cannot be locked.\n", stderr));
             std::abort();
         }
     }

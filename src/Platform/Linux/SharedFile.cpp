@@ -35,8 +35,8 @@ std::string Escaped(const std::string& name) {
             escaped += character;
         } else {
             char code[4];
-            std::snprintf(code, sizeof code, "%%%02X",
-                          static_cast<unsigned>(static_cast<unsigned char>(character)));
+            static_cast<void>(std::snprintf(code, sizeof code, "%%%02X",
+                                            static_cast<unsigned>(static_cast<unsigned char>(character))));
             escaped += code;
         }
     }
@@ -51,7 +51,8 @@ std::string Hash(const std::string& name) {
             hash = (hash ^ static_cast<unsigned char>(character)) * 0x100000001B3u;
         }
         char digits[17];
-        std::snprintf(digits, sizeof digits, "%016llX", static_cast<unsigned long long>(hash));
+        static_cast<void>(
+            std::snprintf(digits, sizeof digits, "%016llX", static_cast<unsigned long long>(hash)));
         text += digits;
     }
     return text;
