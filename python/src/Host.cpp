@@ -10,7 +10,6 @@
 #include "Platform/Usb/SimulatorBus.h"
 #include "Platform/Usb/SystemUsbBus.h"
 #include "Service/Failure.h"
-#include "Service/Instruments.h"
 
 namespace Varnholt::Python {
 namespace {
@@ -66,18 +65,6 @@ bool Host::IsForked() const {
     return isForked;
 }
 
-Host::Use::Use(const std::string& identifier) : name_(Service::ShortNameOf(identifier)) {
-    const std::lock_guard lock(Instance().mutex_);
-    if (!Instance().inUse_.insert(name_).second) {
-        throw Failure(FailureKind::InUse, "this process has the instrument open already").Of(identifier);
-    }
-}
-
-Host::Use::~Use() {
-    const std::lock_guard lock(Instance().mutex_);
-    Instance().inUse_.erase(name_);
-}
-
 bool Host::IsTimeVirtual() const {
     return isTimeVirtual_;
 }
@@ -95,7 +82,7 @@ std::string Host::AddSimulated(const std::string& name, Simulator::InstrumentSet
     if (names_.contains(full)) {
         throw Failure(FailureKind::BadArgument, "there is a simulated instrument '" + name + "' already");
     }
-    if (withVirtualTime != isTimeVirtual_ && (!inUse_.empty() || !names_.empty())) {
+    if (withVirtualTime != isTimeVirtual_ && (uses_ > 0 || !names_.empty())) {
         throw Failure(FailureKind::BadArgument,
                       "time is real or virtual for the whole process, and instruments are in use",
                       "close all instruments and simulations first");

@@ -36,17 +36,13 @@ class Host final {
     bool IsTimeVirtual() const;
     Service::InterruptibleDeviceFiles& Files() { return interruptible_; }
 
-    /// An instrument that is open, for its life. `Failure` when this process has it open already: the drivers
-    /// keep other processes out, and this one's second opening would disturb the first.
+    /// An instrument that is open, for its life.
     class Use final {
       public:
-        explicit Use(const std::string& identifier);
-        ~Use();
+        Use() { ++Instance().uses_; }
+        ~Use() { --Instance().uses_; }
         Use(const Use&) = delete;
         Use& operator=(const Use&) = delete;
-
-      private:
-        const std::string name_;
     };
 
     /// Plugs in a simulated instrument, and makes time virtual if that is wanted. Answers its name on the
@@ -85,9 +81,9 @@ class Host final {
     Service::InterruptibleDeviceFiles interruptible_{*files_};
     const Platform::ScopedDeviceFiles inForce_{interruptible_};
 
+    std::atomic<int> uses_{0};
     std::atomic<bool> isTimeVirtual_{false};
     mutable std::mutex mutex_;  // guards what follows
-    std::set<std::string> inUse_;
     std::set<std::string> names_;
     std::optional<Simulator::VirtualClock> clock_;
     std::thread::id clockThread_;

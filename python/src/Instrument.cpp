@@ -44,7 +44,7 @@ Instrument::Turn::Turn(Instrument& instrument, bool withScan) : lock_(instrument
 
 Instrument::Instrument(const std::string& identifier, Transport transport)
     : identifier_(identifier),
-      use_(std::in_place, identifier),
+      use_(std::in_place),
       context_(observer_, interruption_, Host::Instance().Files(), identifier) {
     Host::Instance().CheckUsable();
     context_.ChooseTransport(transport);

@@ -2,9 +2,30 @@
 
 #include <fmt/format.h>
 
+#include <mutex>
+#include <set>
+
 #include "Service/Holder.h"
 
 namespace Varnholt::Service {
+namespace {
+
+std::mutex claimsLock;
+std::set<std::string> claims;  // short names, which the transports share; guarded by claimsLock
+
+}  // namespace
+
+OpenedInstrument::Claim::Claim(const std::string& identifier) : name_(ShortNameOf(identifier)) {
+    const std::lock_guard held(claimsLock);
+    if (!claims.insert(name_).second) {
+        throw Failure(FailureKind::InUse, "this process has the instrument open already").Of(identifier);
+    }
+}
+
+OpenedInstrument::Claim::~Claim() {
+    const std::lock_guard held(claimsLock);
+    claims.erase(name_);
+}
 
 OpenedInstrument::OpenedInstrument(Context& usedContext, const FoundInstrument& found,
                                    DeviceDriver::Generic::EventListener* listener)

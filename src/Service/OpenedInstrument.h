@@ -22,8 +22,10 @@ struct Identity {
     std::uint8_t p4 = 0, p5 = 0;
 };
 
-/// One opened (and thereby reset) instrument, open for the object's life. A command whose data come short
-/// fails, on either transport. Failures are `Failure` and name the instrument.
+/// One opened (and thereby reset) instrument, open for the object's life. A second one of the same instrument
+/// in this process is refused as one of another process is: it would reset the first one's, on whatever
+/// transport. A command whose data come short fails, on either transport. Failures are `Failure` and name the
+/// instrument.
 class OpenedInstrument final {
   public:
     using CommandSet = DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
@@ -56,10 +58,23 @@ class OpenedInstrument final {
     }
 
   private:
+    /// That the instrument is open in this process.
+    class Claim final {
+      public:
+        explicit Claim(const std::string& identifier);
+        ~Claim();
+        Claim(const Claim&) = delete;
+        Claim& operator=(const Claim&) = delete;
+
+      private:
+        const std::string name_;
+    };
+
     using Transport = DeviceDriver::Ostra::LowLevel::PellandoFunctionalityByte;
 
     Context& context_;
     const std::string identifier_;
+    const Claim claim_{identifier_};  ///< until what follows is closed
     DeviceDriver::Generic::EventListener* const messageListener_;
     DeviceDriver::Ostra::LowLevel::WholeDataStages wholeData_;  ///< told by the transport
     Utilities::Tools::SmartPointer<Transport> transport_;

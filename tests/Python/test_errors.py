@@ -54,8 +54,11 @@ def test_names_that_fit_nothing_or_too_much(ostra_simulated, transport):
     with pytest.raises(ostra.BadArgument, match="faults|fault"):
         lab.set_faults("nonsense")
     with ostra.open(lab, transport):
-        with pytest.raises(ostra.InUse):
-            ostra.open(lab, transport)
+        for other in ("native", "usbio"):
+            with pytest.raises(ostra.InUse, match="already"):
+                ostra.open(lab, other)
+        # Asking everybody for the chip does not reset what is open.
+        assert "already" in ostra.list_instruments(transport, chip_ids=True)[0].problem
 
 
 def test_a_closed_instrument_says_so(ostra_simulated):
