@@ -37,7 +37,7 @@ struct InstrumentSettings {
     std::string serial = "SIM0001";
     std::array<std::uint8_t, 8> chipId{0x5A, 0x01, 0x23, 0x45, 0x67, 0x89, 0xAB, 0xCD};
     std::uint16_t firmware = NewFirmware;
-    MiscValues misc;
+    MiscValues misc{};
     std::uint8_t fifthParameter = 0x55;  ///< p5, which can only be read
 
     /// Modes 1, 2, ... of the new firmware. The old one has the first only.
@@ -46,7 +46,7 @@ struct InstrumentSettings {
     std::uint8_t announcedModes = 0;
 
     /// The EEPROM's content, 8192 bytes; empty: that of a fresh instrument.
-    std::vector<std::uint8_t> eeprom;
+    std::vector<std::uint8_t> eeprom{};
 
     std::uint64_t seed = 1;  ///< of the sensor's noise
     double light = 1.0;      ///< brightness of the lamp; 0 is dark
@@ -64,10 +64,10 @@ struct InstrumentSettings {
     bool takesIntegrationTime = false;
 
     /// Presses the button this long after each time that the instrument is claimed.
-    std::optional<std::uint32_t> buttonAfterMilliseconds;
+    std::optional<std::uint32_t> buttonAfterMilliseconds{};
 
     /// Called after the EEPROM changed, on the thread that brought the change.
-    std::function<void()> memoryChanged;
+    std::function<void()> memoryChanged{};
 };
 
 /// The first, second, ... of several instruments: serial, chip id and seed are its own. Counts from 0.

@@ -2,6 +2,7 @@
 
 #include <array>
 #include <cstdint>
+#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -13,10 +14,14 @@ namespace Varnholt::Tests {
 /// ostra.dll, loaded as a host loads it.
 class ShippedLibrary final {
   public:
-    /// The paths of what is tested, as the command line gave them.
-    static std::string path;
+    /// As the command line gave it.
+    inline static std::string path;
 
-    ShippedLibrary();
+    ShippedLibrary() {
+        if (module == nullptr) {
+            throw std::runtime_error(path + " does not load: error " + std::to_string(GetLastError()));
+        }
+    }
     ~ShippedLibrary() { FreeLibrary(module); }
     ShippedLibrary(const ShippedLibrary&) = delete;
     ShippedLibrary& operator=(const ShippedLibrary&) = delete;
@@ -32,12 +37,15 @@ class ShippedLibrary final {
     /// What the last successful readout has stored.
     std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
 
-    HMODULE module;
+    const HMODULE module = LoadLibraryA(path.c_str());
 
   private:
-    decltype(&f3355d91d5df0e0b) writeImage_;
-    decltype(&d4fb86cecc88582a) takeReadout_;
-    decltype(&b5ae189db26b2a1b) getInformation_;
+    decltype(&f3355d91d5df0e0b) writeImage_ =
+        Platform::FindEntryPoint<decltype(f3355d91d5df0e0b)>(module, "f3355d91d5df0e0b");
+    decltype(&d4fb86cecc88582a) takeReadout_ =
+        Platform::FindEntryPoint<decltype(d4fb86cecc88582a)>(module, "d4fb86cecc88582a");
+    decltype(&b5ae189db26b2a1b) getInformation_ =
+        Platform::FindEntryPoint<decltype(b5ae189db26b2a1b)>(module, "b5ae189db26b2a1b");
 };
 
 }  // namespace Varnholt::Tests

@@ -1,6 +1,7 @@
 #include "StandInDriver.h"
 
 #include <setupapi.h>
+#include <shlwapi.h>
 
 #include <algorithm>
 #include <array>
@@ -32,18 +33,6 @@ void WaitUntil(const std::function<bool()>& condition, const char* what) {
         Check(GetTickCount() - start < 10'000, what);
         Sleep(1);
     }
-}
-
-void DeleteTree(HKEY parent, const char* name) {
-    HKEY key = nullptr;
-    if (RegOpenKeyExA(parent, name, 0, KEY_ALL_ACCESS, &key) == ERROR_SUCCESS) {
-        char child[256];
-        while (RegEnumKeyA(key, 0, child, sizeof child) == ERROR_SUCCESS) {
-            DeleteTree(key, child);
-        }
-        RegCloseKey(key);
-    }
-    RegDeleteKeyA(parent, name);
 }
 
 void WriteDeviceKey(const std::string& name) {
@@ -123,7 +112,7 @@ void StandInDriver::Unplug(const std::string& path) {
     if (found == plugged_.end()) {
         return;
     }
-    DeleteTree(HKEY_LOCAL_MACHINE, (std::string(DeviceKeys) + "\\" + found->key).c_str());
+    SHDeleteKeyA(HKEY_LOCAL_MACHINE, (std::string(DeviceKeys) + "\\" + found->key).c_str());
     plugged_.erase(found);
     Enumerate();
     WaitUntil([&] { return std::ranges::count(List(), path) == 0; }, "instrument to be gone");

@@ -3,6 +3,7 @@
 
 #include "Platform/ErrorCodes.h"
 #include "Platform/HostQueries.h"
+#include "Platform/WaitableObjects.h"
 #include "Platform/Win32/Windows.h"
 
 namespace Varnholt::Platform {
@@ -16,6 +17,14 @@ TEST(SystemQueries, HostTellsWhetherItIs64Bit) {
     int flag = 7;
     EXPECT_TRUE(query(flag));
     EXPECT_EQ(flag != 0, system.wProcessorArchitecture == PROCESSOR_ARCHITECTURE_AMD64);
+}
+
+/// So that other programs which use the instrument find its lock.
+TEST(SystemQueries, MutexesHaveTheNamesThatTheyAreGiven) {
+    const OwnedHandle mutex(MakeMutex("ostra-test-lock"));
+    const HANDLE same = OpenMutexA(SYNCHRONIZE, FALSE, "ostra-test-lock");
+    EXPECT_NE(same, nullptr);
+    CloseHandle(same);
 }
 
 TEST(SystemQueries, ErrorTextsComeAsTheSystemGivesThem) {
