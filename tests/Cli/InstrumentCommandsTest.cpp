@@ -8,11 +8,7 @@ using Cli::ExitCode;
 using Simulator::InstrumentSettings;
 using testing::HasSubstr;
 
-InstrumentSettings Leisurely() {
-    InstrumentSettings settings;
-    settings.takesIntegrationTime = true;
-    return settings;
-}
+const InstrumentSettings Leisurely{.takesIntegrationTime = true};
 
 class InstrumentCommandsTest : public ToolTest {};
 OSTRA_ON_BOTH_TRANSPORTS(InstrumentCommandsTest);
@@ -43,7 +39,7 @@ TEST_P(InstrumentCommandsTest, List) {
 
 /// All forms of one readout hold the same values.
 TEST_P(InstrumentCommandsTest, ReadoutForms) {
-    auto& instrument = host_.Add("sim", Leisurely());
+    auto& instrument = host_.Add("sim", Leisurely);
     Succeed("readout --raw --output @raw");
     EXPECT_EQ(ParametersOf(instrument), (Simulator::MeasureParameters{294, 0, 1, 6}));
     EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 1u);
@@ -96,9 +92,7 @@ TEST_P(InstrumentCommandsTest, ReadoutsSayWhatTheyWereTakenWith) {
              Case{"--integration-time 0.005", {147, 0, 1, 6}, 147 * 34e-6, 2},
              Case{"", {294, 0, 1, 6}, 294 * 68e-6, 1, 60, 2, 300},
          }) {
-        InstrumentSettings settings = Leisurely();
-        settings.firmware = row.firmware;
-        auto& instrument = host_.Add("sim", settings);
+        auto& instrument = host_.Add("sim", {.firmware = row.firmware, .takesIntegrationTime = true});
         Succeed("readout --json --repeat " + std::to_string(row.repeat) + " --interval " +
                 std::to_string(row.interval) + " " + row.options);
         EXPECT_EQ(tool_.Lines().size(), row.repeat);
@@ -144,7 +138,7 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
              Case{"5", "bulk-in 0:stall", never, ExitCode::InputOutput, "; nothing was recorded", 0},
          }) {
         SCOPED_TRACE(row.text);
-        host_.Add("sim", Leisurely());
+        host_.Add("sim", Leisurely);
         SetFaults(row.faults);
         WriteFile(folder_.Path("csv"), {1});
         Service::Interruption interruption;
@@ -164,7 +158,7 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
 }
 
 TEST_P(InstrumentCommandsTest, PlotsUseWhatTheTerminalHas) {
-    host_.Add("sim", Leisurely());
+    host_.Add("sim", Leisurely);
     const auto isBraille = [this](const char* line) {
         Succeed(line);
         EXPECT_NE(tool_.Out().find('*') != std::string::npos,
@@ -199,10 +193,7 @@ TEST_P(InstrumentCommandsTest, PlotsUseWhatTheTerminalHas) {
 }
 
 TEST_P(InstrumentCommandsTest, OutputThatCannotBeWrittenEndsACommandAtOnce) {
-    InstrumentSettings settings;
-    settings.scanBytes = 100'000'000;
-    settings.bytesPerSecond = 100'000;
-    auto& instrument = host_.Add("sim", settings);
+    auto& instrument = host_.Add("sim", {.scanBytes = 100'000'000, .bytesPerSecond = 100'000});
     tool_.CloseOut();
     for (const char* command : {"readout --csv --repeat 60 --interval 1", "monitor --for 60", "scan"}) {
         const Stopwatch watch(clock_);
@@ -214,9 +205,7 @@ TEST_P(InstrumentCommandsTest, OutputThatCannotBeWrittenEndsACommandAtOnce) {
 }
 
 TEST_P(InstrumentCommandsTest, IdentifyAndReset) {
-    InstrumentSettings settings;
-    settings.firmware = 305;
-    auto& instrument = host_.Add("sim", settings);
+    auto& instrument = host_.Add("sim", {.firmware = 305});
     Succeed("identify --json");
     auto found = tool_.Json();
     EXPECT_EQ(found["mode"][0], 3);
@@ -291,10 +280,8 @@ TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
 }
 
 TEST_P(InstrumentCommandsTest, ChipsTellInstrumentsApart) {
-    InstrumentSettings settings;
-    settings.chipId = {1, 2, 3, 4, 5, 6, 7, 8};
     auto& left = host_.Add("left");
-    host_.Add("right", settings);
+    host_.Add("right", {.chipId = {1, 2, 3, 4, 5, 6, 7, 8}});
     Succeed("list --chip-id");
     EXPECT_THAT(tool_.Lines()[2], testing::AllOf(HasSubstr("right"), HasSubstr("0102030405060708")));
     Succeed("identify --device chip:5A0123456789ABCD --json");
@@ -343,41 +330,27 @@ TEST_P(InstrumentCommandsTest, VerboseTellsWhatIsSent) {
 
 TEST(CommandLineTest, UsageErrorsGoToStandardError) {
     ToolRunner tool;
-    for (const auto& [line, text] : std::vector<std::pair<const char*, const char*>>{
-             {"", ""},
-             {"no-such-command", "`ostra` has no command 'no-such-command'"},
-             {"eeprom", "`ostra eeprom --help`"},
-             {"eeprom --no-such-option no-such-command", "`ostra eeprom` has no command 'no-such-command'"},
-             {"help eeprom chekc", "`ostra eeprom` has no command 'chekc'"},
-             {"eeprom check ''", ""},
-             {"identify --device ''", ""},
-             {"readout --no-such-option", ""},
-             {"readout one two", "one two"},
-             {"readout --repeat -1", ""},
-             {"readout --parameters 1,2,3", ""},
-             {"readout --parameters 1,2,3,256", ""},
-             {"readout --parameters 1,2,3,4 --integration-time 1", ""},
-             {"readout --integration-time 0", ""},
-             {"readout --integration-time nan", ""},
-             {"readout --interval nan", ""},
-             {"monitor --for 0", ""},
-             {"scan --records 0", ""},
-             {"scan --total 0", ""},
-             {"scan --record-size 6554", ""},
-             {"scan --record-size 0", ""},
-             {"scan --record-size 7", ""},
-             {"scan --total 256 --records 1", ""},
-             {"scan --json", ""},
-             {"scan --json --output -", ""},
-             {"scan --discard", ""},
-             {"scan --raw --header", ""},
-             {"scan --raw --number", ""},
-             {"scan --raw --time", ""},
-             {"eeprom restore image --no-backup", ""},
-             {"list --transport serial", ""},
-             {"list --capture ''", ""},
-             {"write-image", ""},
-         }) {
+    std::vector<std::pair<std::string, const char*>> wrong{
+        {"", ""},
+        {"no-such-command", "`ostra` has no command 'no-such-command'"},
+        {"eeprom", "`ostra eeprom --help`"},
+        {"eeprom --no-such-option no-such-command", "`ostra eeprom` has no command 'no-such-command'"},
+        {"help eeprom chekc", "`ostra eeprom` has no command 'chekc'"},
+        {"readout one two", "one two"},
+    };
+    std::istringstream others(
+        "eeprom check ''; eeprom restore image --no-backup; identify --device ''; write-image;"
+        "list --transport serial; list --capture ''; monitor --for 0; readout --no-such-option;"
+        "readout --repeat -1; readout --interval nan; readout --integration-time 0;"
+        "readout --integration-time nan; readout --parameters 1,2,3; readout --parameters 1,2,3,256;"
+        "readout --parameters 1,2,3,4 --integration-time 1; scan --records 0; scan --total 0;"
+        "scan --record-size 6554; scan --record-size 0; scan --record-size 7; scan --discard;"
+        "scan --total 256 --records 1; scan --json; scan --json --output -; scan --raw --header;"
+        "scan --raw --number; scan --raw --time");
+    for (std::string line; std::getline(others, line, ';');) {
+        wrong.emplace_back(line, "");
+    }
+    for (const auto& [line, text] : wrong) {
         EXPECT_EQ(tool.Run(line), ExitCode::Usage) << line;
         EXPECT_EQ(tool.Out(), "");
         EXPECT_NE(tool.Err(), "");

@@ -21,6 +21,7 @@
 #include "Output/Table.h"
 #include "Output/WallTimeText.h"
 #include "Service/Failure.h"
+#include "Support/Bytes.h"
 #include "Support/ExpectThrow.h"
 #include "ToolFixture.h"
 #include "Utilities/Files/AtomicFile.h"
@@ -134,7 +135,6 @@ TEST(LiveBlockTest, IsDrawnAnewWhereTheTerminalHasChanged) {
     EXPECT_EQ(Wrapped("lowest 5 at 3, mean 12", 12), "lowest 5 at\n3, mean 12\n");
 }
 
-using Bytes = std::vector<std::uint8_t>;
 using Names = std::vector<std::string>;
 
 class FileTest : public testing::Test {
@@ -170,12 +170,8 @@ TEST_F(FileTest, AnAtomicFileTakesItsNameWhenItIsComplete) {
     EXPECT_THROW(file.Commit(), FileError);
     EXPECT_EQ(Content("new"), "\x07");
     for (const std::string& name : {folder_.Path(""), folder_.Path("missing/file")}) {
-        try {
-            AtomicFile impossible(name);
-            ADD_FAILURE() << name;
-        } catch (const FileError& failure) {
-            EXPECT_THAT(failure.what(), testing::HasSubstr(name));
-        }
+        EXPECT_THAT([&] { AtomicFile impossible(name); },
+                    testing::ThrowsMessage<FileError>(testing::HasSubstr(name)));
     }
 }
 

@@ -11,10 +11,7 @@ using testing::HasSubstr;
 constexpr std::size_t RecordSize = 256;
 
 Simulator::InstrumentSettings Streaming(std::uint64_t bytes, std::uint64_t bytesPerSecond = 0) {
-    Simulator::InstrumentSettings settings;
-    settings.scanBytes = bytes;
-    settings.bytesPerSecond = bytesPerSecond;
-    return settings;
+    return {.scanBytes = bytes, .bytesPerSecond = bytesPerSecond};
 }
 
 class ScanTest : public ToolTest {

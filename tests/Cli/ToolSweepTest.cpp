@@ -100,9 +100,8 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
     Result Run(const FaultPlan& plan) const {
         const TestClock clock(TestTime::Virtual, 1);
         SimulatedHost host(transport_);
-        Simulator::InstrumentSettings settings;
-        settings.scanBytes = command_.recording != nullptr ? 30 * RecordSize : Protocol::ReadoutBytes;
-        auto& instrument = host.Add("sim", settings);
+        auto& instrument = host.Add(
+            "sim", {.scanBytes = command_.recording != nullptr ? 30 * RecordSize : Protocol::ReadoutBytes});
         ToolRunner tool;
         const TestFolder& folder = tool.folder;
         WriteFile(folder.Path("image"), ImageToWrite());

@@ -173,12 +173,9 @@ TEST_P(OnKernel, GoesOnAfterAStall) {
     PellandoFunctionality instrument(nullptr, 0);
     std::array<std::uint8_t, 256> buffer{};
     instrument.SetMeasureParameters(294, 0, 1, 6);
-    try {
-        instrument.MeasureRequest(buffer.data(), 256, 1);
-        ADD_FAILURE() << "no failure";
-    } catch (const DeviceDriverException& exception) {
-        EXPECT_THAT(exception.what(), testing::HasSubstr(GetParam() ? "0xE0000030" : "(Win32 Error (31) : "));
-    }
+    EXPECT_THAT([&] { instrument.MeasureRequest(buffer.data(), 256, 1); },
+                testing::ThrowsMessage<DeviceDriverException>(
+                    testing::HasSubstr(GetParam() ? "0xE0000030" : "(Win32 Error (31) : ")));
     EXPECT_NO_THROW(instrument.MeasureRequest(buffer.data(), 256, 1)) << "the halt is cleared";
 }
 

@@ -52,6 +52,7 @@ struct Diagnosis {
 
 TEST(DoctorTest, NamesTheReasonAndTheFix) {
     constexpr auto NotFound = FailureKind::NotFound, NoPermission = FailureKind::NoPermission;
+    constexpr std::optional<FailureKind> none;
     constexpr const char* answers = "answers (firmware 301)";
     constexpr const char* locked = "no permission on /dev/bus/usb/001/007";
     auto held = Plugged();
@@ -92,13 +93,8 @@ TEST(DoctorTest, NamesTheReasonAndTheFix) {
              {"no USB", {.hasUsb = false}, "p", "this machine has no USB", "usbipd attach", NotFound},
              {"no USB, simulated", withoutUsb, "gn", "this machine has no USB", "/dev/bus/usb", {}, 1},
              {"no lock", withoutLock, "gp", "no lock there", "make room", FailureKind::NoLock, 1},
-             {"no lock needed",
-              needsNoLock,
-              "gn",
-              "no lock there; the transport native needs it",
-              "make room",
-              {},
-              1},
+             {"no lock needed", needsNoLock, "gn", "no lock there; the transport native needs it",
+              "make room", none, 1},
              {"held", With(held), "p", "is in use by python3 (process 42)", "end that program",
               FailureKind::InUse},
              {"silent", With(Plugged("silent")), "np", "does not answer: no answer in time",

@@ -1,6 +1,7 @@
 // What the doctor says on Windows, where kernel drivers present the instruments.
 #include "ExpectFindings.h"
 #include "Platform/HostQueries.h"
+#include "Protocol/ByteOrder.h"
 #include "Protocol/UsbIoDriver.h"
 #include "Service/Win32/Diagnosis.h"
 #include "Support/ScriptedDriver.h"
@@ -28,9 +29,10 @@ struct Case {
 
 TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
     constexpr auto NotFound = FailureKind::NotFound;
-    const std::vector<std::string> native{"native/a"}, usbIo{"usbio/a"};
+    const std::vector<std::string> native{"native/a"}, usbIo{"usbio/a"}, none;
     for (const Case& row : {
-             Case{"nothing", false, {}, "np", "no device with either driver", "look at its cable", NotFound},
+             Case{"nothing", false, none, "np", "no device with either driver", "look at its cable",
+                  NotFound},
              {"own driver", false, native, "ng", "native/a answers"},
              {"USBIO", true, {"usbio/a", "usbio/b"}, "ngg", "usbio/b answers"},
              {"own driver only", true, native, "np",
@@ -43,23 +45,9 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
              {"too new", true, usbIo, "np", "of interface version 3.00", "install a USBIO driver", NotFound,
               0x0300},
              {"the newest", true, usbIo, "ng", "answers", "", {}, 0x02FF},
-             {"no setupapi",
-              true,
-              {},
-              "p",
-              "setupapi.dll, which finds instruments, cannot be",
-              "sfc /scannow",
-              NotFound,
-              0,
-              Errors::ModuleNotFound},
-             {"another setupapi",
-              false,
-              {},
-              "p",
-              "lacks functions",
-              "beside the program",
-              NotFound,
-              0,
+             {"no setupapi", true, none, "p", "setupapi.dll, which finds instruments, cannot be",
+              "sfc /scannow", NotFound, 0, Errors::ModuleNotFound},
+             {"another setupapi", false, none, "p", "lacks functions", "beside the program", NotFound, 0,
               Errors::ProcedureNotFound},
              {"silent", false, native, "np", "does not answer: ", "unplug it", FailureKind::Timeout, 0,
               Errors::Success, true},
@@ -70,8 +58,7 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
         const Platform::ScopedDeviceFiles inForce(driver);
         Platform::Override64BitHost(row.is64Bit);
         Bytes information(12);
-        information[0] = static_cast<std::uint8_t>(row.version);
-        information[1] = static_cast<std::uint8_t>(row.version >> 8);
+        Protocol::StoreLittle16(&information[0], row.version);
         for (int opening = 0; opening < 10; ++opening) {
             driver.Script(Protocol::UsbIoDriver::Control::GetDriverInfo, {.data = information});
         }
@@ -80,8 +67,8 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
         }
         driver.enumerationFailure = row.enumeration;
         Service::Observer nobody;
-        Service::Interruption none;
-        Service::Context context(nobody, none);
+        Service::Interruption never;
+        Service::Context context(nobody, never);
         ExpectFindings(Service::DiagnoseDrivers(context), row.levels, row.text, row.fix, row.failure);
         Platform::Override64BitHost(std::nullopt);
     }

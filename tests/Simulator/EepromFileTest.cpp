@@ -26,11 +26,8 @@ using Tests::TestTransfer;
 class EepromFileTest : public testing::Test {
   protected:
     std::shared_ptr<SimulatedInstrument> MakeInstrument(EepromFile& file) {
-        InstrumentSettings settings;
-        if (file.Exists()) {
-            settings.eeprom = ReadEepromFile(fileName_);
-        }
-        settings.memoryChanged = [&file] { file.MemoryChanged(); };
+        const InstrumentSettings settings{.eeprom = file.Exists() ? ReadEepromFile(fileName_) : Bytes(),
+                                          .memoryChanged = [&file] { file.MemoryChanged(); }};
         auto instrument = std::make_shared<SimulatedInstrument>(loop_, settings);
         file.Keep(instrument);
         return instrument;
@@ -73,12 +70,8 @@ TEST_F(EepromFileTest, UnusableFilesAreExplained) {
                                             {8191U, "has 8191 bytes"},
                                             {8193U, "remove this one to begin with a fresh EEPROM"}}) {
         Tests::WriteFile(fileName_, Bytes(size));
-        try {
-            ReadEepromFile(fileName_);
-            ADD_FAILURE() << size;
-        } catch (const std::runtime_error& error) {
-            EXPECT_THAT(error.what(), HasSubstr(explanation));
-        }
+        EXPECT_THAT([this] { ReadEepromFile(fileName_); },
+                    testing::ThrowsMessage<std::runtime_error>(HasSubstr(explanation)));
     }
     EXPECT_THROW(ReadEepromFile(folder_.Path("none")), std::runtime_error);
     EXPECT_THROW(ReadEepromFile(folder_.Path("")), std::runtime_error);

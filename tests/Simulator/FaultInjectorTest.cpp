@@ -28,11 +28,7 @@ constexpr std::uint32_t ReadLength = 64;
 /// A bus with one instrument whose memory is 0, 1, 2, ...
 class FaultInjectorTest : public testing::Test {
   protected:
-    FaultInjectorTest() {
-        InstrumentSettings settings;
-        settings.eeprom = Counting(Protocol::EepromSize);
-        bus_.Add("one", settings);
-    }
+    FaultInjectorTest() { bus_.Add("one", {.eeprom = Counting(Protocol::EepromSize)}); }
     ~FaultInjectorTest() override { EXPECT_EQ(0U, bus_.Instrument("one").PendingTransfers()); }
 
     std::shared_ptr<UsbDevice> Open(const std::string& plan) {

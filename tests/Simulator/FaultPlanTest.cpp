@@ -49,12 +49,8 @@ TEST(FaultPlanTest, MistakesAreExplained) {
              {"3:stall=1", "stall takes no number"},
              {"1:stall; 2:oops", "\"2:oops\""},
          }) {
-        try {
-            FaultPlan::Parse(text);
-            ADD_FAILURE() << text;
-        } catch (const std::invalid_argument& error) {
-            EXPECT_THAT(error.what(), testing::HasSubstr(explanation)) << text;
-        }
+        EXPECT_THAT([text = text] { FaultPlan::Parse(text); },
+                    testing::ThrowsMessage<std::invalid_argument>(testing::HasSubstr(explanation)));
     }
 }
 

@@ -56,12 +56,8 @@ TEST_F(KernelPortTest, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
 }
 
 TEST_F(KernelPortTest, SaysWhatToDoWhereThereIsNoSuchHost) {
-    try {
-        PlugIntoKernel(7, 0x10002, files_.Path("missing"));
-        ADD_FAILURE();
-    } catch (const std::runtime_error& error) {
-        EXPECT_THAT(error.what(), testing::HasSubstr("modprobe vhci-hcd"));
-    }
+    EXPECT_THAT([this] { PlugIntoKernel(7, 0x10002, files_.Path("missing")); },
+                testing::ThrowsMessage<std::runtime_error>(testing::HasSubstr("modprobe vhci-hcd")));
 }
 
 }  // namespace

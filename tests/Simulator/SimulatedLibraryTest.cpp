@@ -1,5 +1,6 @@
 // The library of simulated instruments as a host uses it. The setup is read with the first call of the
 // process.
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -80,12 +81,8 @@ TEST(SimulatedSetup, SaysWhatIsWrong) {
         {"time=soon", "time=soon: real or virtual is wanted"},
     }};
     for (const auto& [text, message] : rows) {
-        try {
-            SimulatedSetup::Parse(text);
-            ADD_FAILURE() << text;
-        } catch (const std::runtime_error& error) {
-            EXPECT_STREQ(message, error.what());
-        }
+        EXPECT_THAT([text = text] { SimulatedSetup::Parse(text); },
+                    testing::ThrowsMessage<std::runtime_error>(message));
     }
     const SimulatedSetup setup = SimulatedSetup::Parse("seed=5 firmware=old integrate=yes");
     ASSERT_EQ(1U, setup.instruments.size());

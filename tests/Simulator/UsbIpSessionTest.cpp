@@ -22,10 +22,7 @@ using Protocol::Request;
 using Tests::Bytes;
 
 Bytes Packet(const UsbIp::Packet& packet, const Bytes& data = {}) {
-    const UsbIp::PacketBytes header = UsbIp::Encode(packet);
-    Bytes bytes(header.begin(), header.end());
-    bytes.insert(bytes.end(), data.begin(), data.end());
-    return bytes;
+    return Tests::Join(UsbIp::Encode(packet), data);
 }
 
 /// Exports "1-1", which nobody gets.
@@ -131,20 +128,17 @@ TEST_F(UsbIpSessionTest, UnlinkedTransferIsAnsweredOnce) {
     const std::uint32_t victim = late.In(BulkInEndpoint, 64);
     EXPECT_TRUE(late.Take().empty());
     unlink = late.Unlink(victim);
-    Bytes expected = Packet(UsbIp::SubmitReply{victim, connectionReset, 2}, {0x00, 0x01});
-    const Bytes then = Packet(UsbIp::UnlinkReply{unlink, 0});
-    expected.insert(expected.end(), then.begin(), then.end());
-    EXPECT_EQ(expected, late.Take());
+    EXPECT_EQ(Tests::Join(Packet(UsbIp::SubmitReply{victim, connectionReset, 2}, {0x00, 0x01}),
+                          Packet(UsbIp::UnlinkReply{unlink, 0})),
+              late.Take());
 }
 
 TEST_F(UsbIpSessionTest, RefusesPeersThatBreakTheProtocol) {
     const Bytes packet = Packet(UsbIp::SubmitPacket{1, 0, BulkInEndpoint, 64, 0, {}, true});
-    Bytes twice = packet;
-    twice.insert(twice.end(), packet.begin(), packet.end());
     for (const Bytes& sent : {Bytes{0x01, 0x10, 0x80, 0x05, 0, 0, 0, 0},
                               {0x01, 0x11, 0x80, 0x07, 0, 0, 0, 0},
                               Packet(UsbIp::SubmitReply{1, 0, 0}),
-                              twice}) {
+                              Tests::Join(packet, packet)}) {
         Peer peer = sent.size() < 48 ? Peer(exports_) : Peer(Device());
         peer.Send(sent);
         EXPECT_TRUE(peer.session->Over());
@@ -173,15 +167,14 @@ TEST_F(UsbIpSessionTest, PeerThatDoesNotReadIsNotServedFurther) {
     EXPECT_EQ(1 + size / asked, peer.Take().size());
 
     // Nor are the rest of the packets that came together with the one that was too many.
-    InstrumentSettings endless;
-    endless.scanBytes = std::uint64_t{1} << 40;
+    const InstrumentSettings endless{.scanBytes = std::uint64_t{1} << 40};
     Peer hungry(SimulatedInstrument::Connect(std::make_shared<SimulatedInstrument>(scheduler_, endless)));
     hungry.Vendor(Request::Measure, {});
     hungry.Take();
     Bytes packets;
     for (std::uint32_t sequence = 100; sequence < 150; ++sequence) {
-        const Bytes bytes = Packet(UsbIp::SubmitPacket{sequence, 0, BulkInEndpoint, 1U << 20, 0, {}, true});
-        packets.insert(packets.end(), bytes.begin(), bytes.end());
+        packets = Tests::Join(
+            packets, Packet(UsbIp::SubmitPacket{sequence, 0, BulkInEndpoint, 1U << 20, 0, {}, true}));
     }
     EXPECT_EQ(4U * UsbIp::PacketHeaderSize, hungry.session->Receive(packets));
     EXPECT_LT(hungry.session->Output().size(), std::size_t{6} << 20);

@@ -17,6 +17,14 @@ inline Bytes Counting(std::size_t count, unsigned first = 0) {
     return bytes;
 }
 
+/// One behind the other.
+template <class... Parts>
+Bytes Join(const Parts&... parts) {
+    Bytes all;
+    (all.insert(all.end(), parts.begin(), parts.end()), ...);
+    return all;
+}
+
 /// An image whose pieces differ.
 inline Bytes CountingImage(unsigned first = 0) {
     Bytes image(8192);

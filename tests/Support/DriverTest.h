@@ -12,12 +12,15 @@
 #include "DeviceDriver/Generic/EventListener.h"
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Platform/EventScheduler.h"
+#include "Platform/HostQueries.h"
 #include "Platform/TestThread.h"
 #include "Platform/Threads.h"
 #include "Platform/WaitableObjects.h"
 #include "Support/ExpectThrow.h"
+#include "Support/FailCalls.h"
 #include "Support/ScriptedDriver.h"
 #include "Support/TestClock.h"
+#include "Support/Transport.h"
 
 namespace Varnholt::Tests {
 
@@ -33,10 +36,39 @@ class DriverTest : public testing::Test {
     explicit DriverTest(TestTime time = TestTime::RealForThreadSanitizer,
                         std::vector<std::string> paths = {"native/1", "usbio/1"})
         : clock_(time), driver_(std::move(paths)) {}
+    ~DriverTest() override {
+        Platform::InstallCallFilter({});
+        Platform::Override64BitHost(std::nullopt);
+    }
+
+    /// Without the reads of the interrupt listener over USBIO.
+    static Lines WithoutListener(Lines lines) {
+        std::erase_if(lines, [](const std::string& line) {
+            return line.starts_with("read 84") || line.starts_with("cancel 84");
+        });
+        return lines;
+    }
 
     TestClock clock_;  // before all that has to do with time
     ScriptedDriver driver_;
     Platform::ScopedDeviceFiles files_{driver_};
+};
+
+/// The same on a host with one of the transports.
+class TransportTest : public DriverTest, public testing::WithParamInterface<Transport> {
+  protected:
+    TransportTest() : DriverTest(TestTime::RealForThreadSanitizer, Paths(2)) {
+        Platform::Override64BitHost(!IsNative());
+    }
+
+    static bool IsNative() { return GetParam() == Transport::Native; }
+    static Lines Paths(std::size_t count) {
+        Lines paths;
+        while (paths.size() < count) {
+            paths.push_back(Name(GetParam()) + ("/" + std::to_string(paths.size() + 1)));
+        }
+        return paths;
+    }
 };
 
 /// Lets other threads get on until `condition` holds; fails the test when that takes 20 seconds.

@@ -79,7 +79,7 @@ void ScriptedDriver::OnOpen(const std::string& path, std::function<ErrorCode()> 
     openActions_[path] = std::move(action);
 }
 
-bool ScriptedDriver::CompleteAs(std::uint32_t place, const Answer* answer) {
+bool ScriptedDriver::Complete(std::uint32_t place, const std::optional<Answer>& answer) {
     std::uint64_t number = 0;
     ErrorCode code = Errors::Success;
     {
@@ -116,25 +116,16 @@ std::size_t ScriptedDriver::OpenFiles() const {
         std::ranges::count_if(files_, [](const auto& file) { return file->isOpen; }));
 }
 
-std::size_t ScriptedDriver::RunningTransfers() const {
+std::size_t ScriptedDriver::Running(std::optional<std::uint32_t> place) const {
     const std::lock_guard held(lock_);
-    return running_.size();
-}
-
-std::size_t ScriptedDriver::Running(std::uint32_t place) const {
-    const std::lock_guard held(lock_);
-    return static_cast<std::size_t>(std::ranges::count(running_, place, &Transfer::place));
+    return place ? static_cast<std::size_t>(std::ranges::count(running_, *place, &Transfer::place))
+                 : running_.size();
 }
 
 std::uint64_t ScriptedDriver::BytesIn(std::uint32_t place) const {
     const std::lock_guard held(lock_);
     const auto found = bytesIn_.find(place);
     return found == bytesIn_.end() ? 0 : found->second;
-}
-
-std::size_t ScriptedDriver::MostControlsAtOnce() const {
-    const std::lock_guard held(lock_);
-    return mostControls_;
 }
 
 bool ScriptedDriver::LoadEnumeration() {
@@ -272,8 +263,6 @@ bool ScriptedDriver::Start(const File& file, std::uint32_t code, std::string lin
         record.internalHigh = 0;
         running_.push_back(
             {number, &file, place, &record, target, length, std::this_thread::get_id(), answer});
-        mostControls_ = std::max(
-            mostControls_, static_cast<std::size_t>(std::ranges::count(running_, 0U, &Transfer::place)));
     }
     if (answer.after == 0) {
         End(number, answer.code, true);

@@ -64,19 +64,15 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     }
     /// Completes the oldest running transfer of the pipe or endpoint, as it was scripted or with another
     /// answer; false if none runs.
-    bool Complete(std::uint32_t place) { return CompleteAs(place, nullptr); }
-    bool Complete(std::uint32_t place, const Answer& answer) { return CompleteAs(place, &answer); }
+    bool Complete(std::uint32_t place, const std::optional<Answer>& answer = {});
 
     /// What happened since the last call; the transfers are all but opens and closes of files.
     std::vector<std::string> TakeTranscript();
     std::vector<std::string> TakeTransfers();
     std::size_t OpenFiles() const;
-    std::size_t RunningTransfers() const;
-    std::size_t Running(std::uint32_t place) const;  ///< 0: controls
+    std::size_t Running(std::optional<std::uint32_t> place = {}) const;  ///< 0: controls; without one: all
     /// What all reads of the place brought in together.
     std::uint64_t BytesIn(std::uint32_t place) const;
-    /// The most controls that were ever running at once.
-    std::size_t MostControlsAtOnce() const;
 
     /// What keeps the enumeration from being loaded.
     Platform::ErrorCode enumerationFailure = Platform::Errors::Success;
@@ -113,7 +109,6 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
         bool isCancelled = false;
     };
 
-    bool CompleteAs(std::uint32_t place, const Answer* answer);
     File* Find(Platform::Handle handle);
     Answer TakeAnswer(std::uint32_t place, std::uint32_t code, const Answer& usual);
     /// `code`: of a control; 0 for others.
@@ -133,7 +128,6 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     std::vector<Platform::EventScheduler::EventId> events_;
     std::map<std::uint32_t, std::uint64_t> bytesIn_;
     std::uint64_t lastNumber_ = 0;
-    std::size_t mostControls_ = 0;
 };
 
 }  // namespace Varnholt::Tests

@@ -276,11 +276,7 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
     const Transport transport_ = std::get<0>(GetParam());
     const Operation operation_ = Operations()[std::get<1>(GetParam())];
 
-    Simulator::InstrumentSettings Settings() const {
-        Simulator::InstrumentSettings settings;
-        settings.scanBytes = operation_.scanBytes;
-        return settings;
-    }
+    Simulator::InstrumentSettings Settings() const { return {.scanBytes = operation_.scanBytes}; }
 
     std::size_t toldTransfers_ = SIZE_MAX;  ///< the first ones, of which a failure does not stay untold
 

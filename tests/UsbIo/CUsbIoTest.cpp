@@ -24,10 +24,8 @@ using Tests::Never;
 TEST(CUsbIoErrorText, EveryStatusHasTheTextOfTheDocumentedTable) {
     const std::string unknown = StatusText(5);
     EXPECT_EQ(unknown, "Windows system error code.");
-    std::vector<std::uint32_t> statuses{0};
-    for (std::uint32_t status = 0xE0000000; status <= 0xE0060000; ++status) {
-        statuses.push_back(status);
-    }
+    std::vector<std::uint32_t> statuses(0x60002);
+    std::iota(statuses.begin() + 1, statuses.end(), 0xE0000000);
     statuses.insert(statuses.end(), {0xE8000FFF, 0xE8001000, 0xE8001001});
     // FNV-1a over the table as USBIO's documentation has it: "0xE0000001 HC Error: Wrong CRC." and a line's
     // end, ordered by code.
@@ -118,19 +116,16 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
         std::function<void()> arrange;
         std::uint32_t expected;
     };
-    const auto failing = [](std::string_view which, Platform::ErrorCode code) {
-        Platform::InstallCallFilter(
-            [which, code](std::string_view call) { return call == which ? code : 0; });
-    };
+    using Tests::FailCalls;
     const std::vector<Case> cases{
         {"no such device", 2, [] {}, Status::NoSuchDeviceInstance},
         {"negative number", -1, [] {}, Status::NoSuchDeviceInstance},
         {"file not found", 0, [&] { driver_.RefuseOpen("usbio/1", 2); }, Status::DeviceNotFound},
         {"file refused", 0, [&] { driver_.RefuseOpen("usbio/1", 5); }, 5},
-        {"no event", 1, [&] { failing("MakeAutoResetEvent", 8); }, Status::NoMemory},
-        {"no enumeration", 0, [&] { failing("LoadEnumeration", 126); }, Status::NoEnumeration},
-        {"interface cannot be read", 0, [&] { failing("ReadPath", 13); }, 13},
-        {"no detail", 0, [&] { failing("ReadPath", Platform::Errors::NoInterfaceDetail); }, Status::Failed},
+        {"no event", 1, [] { FailCalls("MakeAutoResetEvent", 8); }, Status::NoMemory},
+        {"no enumeration", 0, [] { FailCalls("LoadEnumeration", 126); }, Status::NoEnumeration},
+        {"interface cannot be read", 0, [] { FailCalls("ReadPath", 13); }, 13},
+        {"no detail", 0, [] { FailCalls("ReadPath", Platform::Errors::NoInterfaceDetail); }, Status::Failed},
         {"driver refuses", 1, [&] { driver_.Script(Control::GetDriverInfo, {.code = 31, .after = 5}); }, 31},
         {"driver tells nothing", 1, [&] { driver_.Script(Control::GetDriverInfo, {}); },
          Status::VersionMismatch},
@@ -210,15 +205,13 @@ TEST_F(CUsbIoTest, ControlsOfSeveralThreadsRunOneAtATime) {
     ASSERT_EQ(Open(device), Status::Success);
     const auto work = [&] {
         for (int i = 0; i < 5; ++i) {
-            driver_.Script(Control::UnconfigureDevice, {.after = 2});
+            driver_.Script(Control::UnconfigureDevice,
+                           {.after = 2, .onStart = [&] { EXPECT_EQ(driver_.Running(), 0U); }});
             EXPECT_EQ(device.UnconfigureDevice(), 0U);
         }
     };
-    {
-        const Tests::BackgroundThread other(work);
-        work();
-    }
-    EXPECT_EQ(driver_.MostControlsAtOnce(), 1U);
+    const Tests::BackgroundThread other(work);
+    work();
 }
 
 constexpr std::uint32_t Pending = Platform::Errors::IoPending;
@@ -327,7 +320,7 @@ TEST_F(CUsbIoPipeTest, RefusesTransfersThatCannotBeRight) {
     EXPECT_FALSE(pipe_.Write(buffer));
     EXPECT_EQ(buffer.Status, Platform::Errors::InvalidHandle);
 
-    Platform::InstallCallFilter([](std::string_view) { return Platform::Errors::NoSystemResources; });
+    Tests::FailCalls("MakeAutoResetEvent");
     CUsbIoBuffer withoutEvent(8);
     Platform::InstallCallFilter({});
     withoutEvent.NumberOfBytesToTransfer = 8;

@@ -136,9 +136,7 @@ TEST_F(CUsbIoThreadTest, ReadsAStreamInOrder) {
 }
 
 TEST_F(CUsbIoThreadTest, NeedsAnEventAndRoomToReadInto) {
-    Platform::InstallCallFilter([](std::string_view call) {
-        return call == "MakeAutoResetEvent" ? Platform::Errors::NoSystemResources : Platform::Errors::Success;
-    });
+    Tests::FailCalls("MakeAutoResetEvent");
     EXPECT_FALSE(reader_.StartThread());
     Platform::InstallCallFilter({});
     for (const std::uint32_t size : {0U, 1U}) {

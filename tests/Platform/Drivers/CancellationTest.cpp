@@ -40,7 +40,8 @@ class Round final {
         : random_(seed),
           ending_(static_cast<Ending>(seed % 4)),
           longestPause_(pace.longestPause),
-          instrument_(bus_.Add("port1", Endless(pace.bytesPerSecond))) {}
+          instrument_(bus_.Add(
+              "port1", {.scanBytes = std::uint64_t{1} << 40, .bytesPerSecond = pace.bytesPerSecond})) {}
 
     void Play() {
         Request measure;
@@ -90,12 +91,6 @@ class Round final {
         bool started = false;
     };
 
-    static Simulator::InstrumentSettings Endless(std::uint64_t bytesPerSecond) {
-        Simulator::InstrumentSettings settings;
-        settings.scanBytes = std::uint64_t{1} << 40;
-        settings.bytesPerSecond = bytesPerSecond;
-        return settings;
-    }
     std::uint32_t Pause() { return static_cast<std::uint32_t>(random_() % (longestPause_ + 1)); }
 
     void Start(Read& read) {

@@ -1,10 +1,10 @@
 #include <thread>
 #include <vector>
 
-#include "Platform/CallFilter.h"
 #include "Platform/Drivers/DriverFixture.h"
 #include "Platform/EventScheduler.h"
 #include "Platform/Threads.h"
+#include "Support/FailCalls.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -49,9 +49,7 @@ TEST_F(OverlappedFiles, SignalAtCompletionAndResetAtStart) {
 TEST_F(OverlappedFiles, WaitWithoutAnEvent) {
     Request bare;
     bare.record.event = Platform::NoHandle;
-    Platform::InstallCallFilter([](std::string_view call) {
-        return call == "MakeAutoResetEvent" ? Errors::NoSystemResources : Errors::Success;
-    });
+    FailCalls("MakeAutoResetEvent");
     for (Request* const request : {&bare, &request_}) {
         StartPending(pipe_, buffer_, *request);
         std::thread sender([this] {
@@ -163,16 +161,12 @@ TEST_F(OverlappedFiles, RefuseHandlesThatNameNothing) {
 // signal keep anybody waiting.
 TEST_F(OverlappedFiles, FailuresPutInNeitherReleaseTheBufferNorKeepTheSignal) {
     StartPending(pipe_, buffer_, request_);
-    Platform::InstallCallFilter(
-        [](std::string_view call) { return call == "GetResult" ? Errors::GeneralFailure : Errors::Success; });
+    FailCalls("GetResult", Errors::GeneralFailure);
     EXPECT_EQ(Result(pipe_, request_).code, Errors::IoIncomplete);
     device_->Send(In, {1, 2, 3});
     EXPECT_EQ(Result(pipe_, request_, true), (Outcome{Errors::GeneralFailure, 3}));
 
-    int signals = 0;
-    Platform::InstallCallFilter([&signals](std::string_view call) {
-        return call == "SignalEvent" && ++signals == 1 ? Errors::GeneralFailure : Errors::Success;
-    });
+    FailCalls("SignalEvent", Errors::GeneralFailure, 1);
     StartPending(pipe_, buffer_, request_);
     EXPECT_EQ(request_.record.internalHigh, 0u) << "nothing has moved yet";
     device_->Send(In, {1});

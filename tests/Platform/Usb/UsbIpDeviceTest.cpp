@@ -14,36 +14,25 @@
 
 #include "Platform/Usb/UsbIpDevice.h"
 #include "Platform/Usb/UsbIpSocket.h"
+#include "Support/Bytes.h"
 #include "Support/SignalMasks.h"
 #include "Support/TestTransfer.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
 
-using Bytes = std::vector<std::uint8_t>;
 using Clock = std::chrono::steady_clock;
 using Protocol::BulkInEndpoint;
 using Protocol::BulkOutEndpoint;
-using Tests::TestTransfer;
-
-template <class Array>
-Bytes operator+(Bytes bytes, const Array& more) {
-    bytes.insert(bytes.end(), more.begin(), more.end());
-    return bytes;
-}
+using namespace Tests;
 
 Bytes ImportReply(UsbIp::OperationStatus status = UsbIp::OperationStatus::Ok) {
-    UsbIp::OperationHeader header;
-    header.operation = UsbIp::Operation::ImportReply;
-    header.status = status;
-    const Bytes bytes = Bytes() + UsbIp::Encode(header);
-    if (status != UsbIp::OperationStatus::Ok) {
-        return bytes;
-    }
+    const auto header =
+        UsbIp::Encode(UsbIp::OperationHeader{UsbIp::ProtocolVersion, UsbIp::Operation::ImportReply, status});
     UsbIp::DeviceRecord record;
     record.busNumber = 3;
     record.deviceNumber = 4;
-    return bytes + UsbIp::Encode(record);
+    return status == UsbIp::OperationStatus::Ok ? Join(header, UsbIp::Encode(record)) : Join(header);
 }
 
 class UsbIpDeviceTest : public testing::Test {
@@ -106,7 +95,7 @@ TEST_F(UsbIpDeviceTest, ImportAndPacketsAreWhatTheProtocolSays) {
     const auto device = MakeDevice();
     ASSERT_EQ(Errors::Success, device->Claim());
     EXPECT_EQ(Errors::Success, device->Claim()) << "it is this device's already";
-    EXPECT_EQ((Bytes{0x01, 0x11, 0x80, 0x03, 0, 0, 0, 0, '1', '-', '1'} + Bytes(29)), PeerReceives(40));
+    EXPECT_EQ(Join(Bytes{0x01, 0x11, 0x80, 0x03, 0, 0, 0, 0, '1', '-', '1'}, Bytes(29)), PeerReceives(40));
 
     TestTransfer request = TestTransfer::Vendor(Protocol::Request::Reset, {31});
     TestTransfer readout = TestTransfer::In(BulkInEndpoint, 256);
@@ -124,7 +113,7 @@ TEST_F(UsbIpDeviceTest, ImportAndPacketsAreWhatTheProtocolSays) {
     EXPECT_NE(first.sequence, second.sequence);
 
     // Answered in the other order.
-    PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{second.sequence, 0, 3}) + Bytes{7, 8, 9});
+    PeerSends(Join(UsbIp::Encode(UsbIp::SubmitReply{second.sequence, 0, 3}), Bytes{7, 8, 9}));
     ASSERT_TRUE(readout.Wait());
     EXPECT_EQ(TransferStatus::Completed, readout.status);
     EXPECT_EQ((Bytes{7, 8, 9}), readout.Data());
@@ -158,9 +147,8 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
         EXPECT_EQ(submit.sequence, unlink.victim) << test.name;
         if (test.submitStatus) {
             const auto length = static_cast<std::uint32_t>(test.data.size());
-            PeerSends(Bytes() +
-                      UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, *test.submitStatus, length}) +
-                      test.data);
+            PeerSends(Join(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, *test.submitStatus, length}),
+                           test.data));
         }
         PeerSends(UsbIp::Encode(UsbIp::UnlinkReply{unlink.sequence, test.unlinkStatus}));
         ASSERT_TRUE(transfer.Wait()) << test.name;
@@ -172,7 +160,7 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
     TestTransfer last = TestTransfer::In(BulkInEndpoint, 1);
     device->Submit(last);
     const auto submit = PeerReceivesPacket<UsbIp::SubmitPacket>();
-    PeerSends(Bytes() + UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 1}) + Bytes{9});
+    PeerSends(Join(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 1}), Bytes{9}));
     ASSERT_TRUE(last.Wait());
     EXPECT_EQ(1, last.completions);
 }
@@ -201,7 +189,7 @@ TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
         ASSERT_EQ(Errors::Success, device->Submit(first));
         ASSERT_EQ(Errors::Success, device->Submit(second));
         const std::uint32_t sequence = PeerReceivesPacket<UsbIp::SubmitPacket>().sequence + test.sequence;
-        Bytes reply = Bytes() + UsbIp::Encode(UsbIp::SubmitReply{sequence, 0, test.announced});
+        Bytes reply = Join(UsbIp::Encode(UsbIp::SubmitReply{sequence, 0, test.announced}));
         reply.resize(test.sent);
         PeerSends(reply);
         if (test.leaves) {
@@ -226,14 +214,14 @@ TEST_F(UsbIpDeviceTest, SilentPeerDoesNotHoldUpACancellation) {
     device->Submit(cancelled);
     device->Submit(other);
     EXPECT_FALSE(other.Wait(std::chrono::milliseconds(100)));
-    Tests::ExpectOtherThreadsBlockHostSignals();
+    ExpectOtherThreadsBlockHostSignals();
     const auto start = Clock::now();
     device->Cancel(cancelled);
-    ASSERT_TRUE(cancelled.Wait());
-    ASSERT_TRUE(other.Wait());
+    for (TestTransfer* const each : {&cancelled, &other}) {
+        ASSERT_TRUE(each->Wait());
+        EXPECT_EQ(TransferStatus::DeviceGone, each->status);
+    }
     EXPECT_LT(Clock::now() - start, std::chrono::seconds(3));
-    EXPECT_EQ(TransferStatus::DeviceGone, cancelled.status);
-    EXPECT_EQ(TransferStatus::DeviceGone, other.status);
 }
 
 TEST_F(UsbIpDeviceTest, PeerThatDoesNotReadDoesNotHoldUpASubmission) {

@@ -56,20 +56,13 @@ Lines OnTheWire(bool isNative, const std::string& wire) {
 }
 
 /// The command set over either driver.
-class Commands : public DriverTest, public testing::WithParamInterface<Transport> {
+class Commands : public TransportTest {
   protected:
-    Commands() : DriverTest(TestTime::RealForThreadSanitizer, Paths(2)) { Override64BitHost(!IsNative()); }
     ~Commands() override {
         Close();
-        Override64BitHost(std::nullopt);
         EXPECT_EQ(driver_.OpenFiles(), 0U);
     }
 
-    static Lines Paths(std::size_t count) {
-        const std::string path = std::string(Name(GetParam())) + "/";
-        return count == 0 ? Lines() : Lines{path + "1", path + "2"};
-    }
-    static bool IsNative() { return GetParam() == Transport::Native; }
     static std::uint32_t In() { return IsNative() ? 1U : Protocol::BulkInEndpoint; }
     static std::uint32_t Out() { return IsNative() ? 2U : Protocol::BulkOutEndpoint; }
     static std::uint32_t Interrupts() { return IsNative() ? 3U : Protocol::InterruptInEndpoint; }
@@ -85,14 +78,7 @@ class Commands : public DriverTest, public testing::WithParamInterface<Transport
         instrument_.reset();
         transport_ = Pointer();
     }
-    /// Without the interrupt listener's reads.
-    Lines TakeTransfers() {
-        Lines lines = driver_.TakeTransfers();
-        std::erase_if(lines, [](const std::string& line) {
-            return line.starts_with("read 84") || line.starts_with("cancel 84");
-        });
-        return lines;
-    }
+    Lines TakeTransfers() { return WithoutListener(driver_.TakeTransfers()); }
     void ExpectOnTheWire(const std::string& wire) { EXPECT_EQ(TakeTransfers(), OnTheWire(IsNative(), wire)); }
 
     RecordingListener listener_;
@@ -106,13 +92,11 @@ const Bytes None;
 std::uint16_t a, b, c;
 Bytes m(8);
 
+Bytes Word(std::uint16_t value) {
+    return {static_cast<std::uint8_t>(value >> 8), static_cast<std::uint8_t>(value)};
+}
 Bytes Parameters(std::uint8_t first, std::uint8_t second) {
-    Bytes bytes;
-    for (const std::uint16_t value : {a, b, c}) {
-        bytes.insert(bytes.end(), {static_cast<std::uint8_t>(value >> 8), static_cast<std::uint8_t>(value)});
-    }
-    bytes.insert(bytes.end(), {first, second});
-    return bytes;
+    return Join(Word(a), Word(b), Word(c), Bytes{first, second});
 }
 
 struct Command {
@@ -134,10 +118,7 @@ const Command EachCommand[] = {
     {"WriteEEPROM", "C3@0 00 01 10 00 00 03 00 00|out 31 32 33|out 00|out 00",
      [](I& i) { return i.WriteEEPROM(0x11000, Counting(3, 0x31)), None; }},
     {"WriteCPLD", "C7@0 01 2C 03 04 05 06", [](I& i) { return i.WriteCPLD(0x012C, 0x0304, 0x0506), None; }},
-    {"ReadCPLD", "C8@0 [2]",
-     [](I& i) {
-         return i.ReadCPLD(a), Bytes{Parameters(0, 0)[0], Parameters(0, 0)[1]};
-     }},
+    {"ReadCPLD", "C8@0 [2]", [](I& i) { return i.ReadCPLD(a), Word(a); }},
     {"DownloadRAMFirmware", "A0@1234 31 32 33",
      [](I& i) { return i.DownloadFirmware(0x1234, Counting(3, 0x31), false), None; }},
     {"DownloadEEPROMFirmware", "CB@0 00 00 12 34 00 03 00 00|out 31 32 33|out 00|out 00",
@@ -179,10 +160,8 @@ TEST_P(Commands, MoveMemoryInPiecesThatTheWireCanCarry) {
     instrument.WriteEEPROM(0, {});
     Lines lines =
         OnTheWire(IsNative(), "C3@0 00 00 10 00 01 00 00 00|out " + Hex(&data[0], 256) + "|out 00|out 00");
-    for (const std::string& line :
-         OnTheWire(IsNative(), "C3@0 00 00 11 00 00 01 00 00|out 00|out 00|out 00")) {
-        lines.push_back(line);
-    }
+    std::ranges::move(OnTheWire(IsNative(), "C3@0 00 00 11 00 00 01 00 00|out 00|out 00|out 00"),
+                      std::back_inserter(lines));
     EXPECT_EQ(TakeTransfers(), lines);
     const std::pair<std::size_t, const char*> reads[] = {{1, "C4@0 00 01 10 C0 00 40 00 00|in [64]"},
                                                          {64, "C4@0 00 01 10 C0 00 40 00 00|in [64]"},
@@ -330,7 +309,7 @@ TEST_P(Commands, PassMessagesOnUntilTheListenerIsRemoved) {
     PellandoFunctionality& instrument = Open();
     for (const bool isRemoved : {false, true}) {
         SleepMilliseconds(50);  // an interrupt just after the opening is thrown away
-        EXPECT_TRUE(driver_.Complete(Interrupts(), {.data = {1}}));
+        EXPECT_TRUE(driver_.Complete(Interrupts(), Answer{.data = {1}}));
         SleepMilliseconds(50);
         EXPECT_THAT(listener_.Codes(), ElementsAre(MessageButtonData)) << isRemoved;
         instrument.removeListener(&listener_);

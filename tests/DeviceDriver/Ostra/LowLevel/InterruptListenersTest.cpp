@@ -245,7 +245,7 @@ TEST_F(NativeInterruptListener, EndsAReadThatCannotBeCancelledWithItsPipe) {
     const Stopwatch watch(clock_);
     listener_->Stop();
     watch.ExpectBetween(10'000, 11'000);
-    EXPECT_EQ(driver_.RunningTransfers(), 0U);
+    EXPECT_EQ(driver_.Running(), 0U);
     EXPECT_THAT(driver_.TakeTranscript(), testing::Contains("close " + InterruptPath));
     EXPECT_THAT(receiver_.Codes(), IsEmpty());
 }

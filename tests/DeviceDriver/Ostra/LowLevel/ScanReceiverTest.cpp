@@ -30,9 +30,7 @@ class ReceivedScan : public testing::TestWithParam<Transport> {
     static constexpr std::uint32_t Records = 1000;
 
     static Simulator::InstrumentSettings Streaming() {
-        Simulator::InstrumentSettings settings;
-        settings.scanBytes = std::uint64_t{Record} * Records;
-        return settings;
+        return {.scanBytes = std::uint64_t{Record} * Records};
     }
     static bool IsNative() { return GetParam() == Transport::Native; }
 

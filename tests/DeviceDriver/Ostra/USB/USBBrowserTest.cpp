@@ -2,10 +2,7 @@
 
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
-#include "Platform/CallFilter.h"
-#include "Platform/HostQueries.h"
 #include "Support/DriverTest.h"
-#include "Support/Transport.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -15,23 +12,7 @@ using DeviceDriver::Ostra::LowLevel::PellandoUSBDevice;
 using DeviceDriver::Ostra::USB::USBBrowser;
 using testing::ElementsAreArray;
 
-class Browser : public DriverTest, public testing::WithParamInterface<Transport> {
-  protected:
-    Browser() { Override64BitHost(!IsNative()); }
-    ~Browser() override {
-        InstallCallFilter({});
-        Override64BitHost(std::nullopt);
-    }
-
-    static bool IsNative() { return GetParam() == Transport::Native; }
-    static Lines Paths(std::size_t count) {
-        Lines paths;
-        for (std::size_t i = 0; i < count; ++i) {
-            paths.push_back(Name(GetParam()) + ("/" + std::to_string(i)));
-        }
-        return paths;
-    }
-};
+class Browser : public TransportTest {};
 
 TEST_P(Browser, ListsAfreshUpTo127Instruments) {
     const auto browser = USBBrowser::Instance();
@@ -61,8 +42,7 @@ TEST_P(Browser, ListsAfreshUpTo127Instruments) {
     three.RefuseOpen(Paths(2)[1], Errors::AccessDenied);
     EXPECT_THAT(browser->GetDevices(0), ElementsAreArray(Paths(IsNative() ? 3 : 1))) << "those that open";
     for (const char* failing : {"MakeList", "LoadEnumeration", "ReadPath"}) {
-        InstallCallFilter(
-            [&](std::string_view call) { return call == failing ? Errors::InvalidData : Errors::Success; });
+        FailCalls(failing, Errors::InvalidData);
         EXPECT_THAT(browser->GetDevices(0), testing::IsEmpty()) << failing;
     }
 }

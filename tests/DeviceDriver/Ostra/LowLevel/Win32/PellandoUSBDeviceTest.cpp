@@ -28,11 +28,6 @@ constexpr std::uint32_t InterruptPipe = 3;
 const Answer ButtonData{.data = {1}};
 const std::string Path = "native/1";
 
-void FailCalls(std::string_view name) {
-    InstallCallFilter(
-        [name](std::string_view call) { return call == name ? Errors::NoSystemResources : Errors::Success; });
-}
-
 using UsbConnection = NativeTest;
 
 TEST_F(UsbConnection, LeavesNothingOpenOfWhatItCannotMakeOrOpensAnew) {
@@ -100,7 +95,7 @@ TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
         row.pipe == 0 ? ExpectThrow<TimeoutException>(row.text, operation)
                       : ExpectThrow<IOException>(row.text, operation);
         watch.Expect(row.milliseconds);
-        EXPECT_EQ(driver_.RunningTransfers(), 0u);
+        EXPECT_EQ(driver_.Running(), 0u);
     }
 }
 
@@ -125,7 +120,7 @@ TEST_F(UsbConnection, GivesWhatAnInterruptBroughtUntilSomebodySignalsItsEvent) {
             read({.data = Counting(2, 1), .after = Never, .cancelledAfter = 3, .cancelledWithData = arrives}),
             arrives ? 2u : 0u)
             << "data that arrive during the cancellation count";
-        EXPECT_EQ(driver_.RunningTransfers(), 0u);
+        EXPECT_EQ(driver_.Running(), 0u);
     }
 }
 
@@ -199,7 +194,7 @@ TEST_F(NativeDevice, ThatCannotBeOpenedLeavesNothingBehind) {
 TEST_F(NativeDevice, ClosesItsPipesWhenTheInstrumentIsGone) {
     auto device = Open();
     driver_.TakeTranscript();
-    driver_.Complete(InterruptPipe, {.code = Errors::DeviceNotConnected});
+    driver_.Complete(InterruptPipe, Answer{.code = Errors::DeviceNotConnected});
     WaitUntil([&] { return driver_.OpenFiles() == 0; });
     EXPECT_THAT(listener_.Codes(), ElementsAre(MessageDeviceGone));
     EXPECT_THAT(driver_.TakeTranscript(), ElementsAre("close native/1\\PIPE02", "close native/1\\PIPE01",

@@ -25,20 +25,9 @@ class UsbIoTest : public DriverTest {
     UsbIoTest() : DriverTest(TestTime::RealForThreadSanitizer, {"usbio/1", "usbio/2", "usbio/3"}) {
         Platform::Override64BitHost(true);
     }
-    ~UsbIoTest() override {
-        Platform::InstallCallFilter({});
-        Platform::Override64BitHost(std::nullopt);
-        EXPECT_EQ(driver_.OpenFiles(), 0U);
-    }
+    ~UsbIoTest() override { EXPECT_EQ(driver_.OpenFiles(), 0U); }
 
-    /// What happened since the last call, without the interrupt listener's reads.
-    Lines TakeTranscript() {
-        Lines lines = driver_.TakeTranscript();
-        std::erase_if(lines, [](const std::string& line) {
-            return line.starts_with("read 84") || line.starts_with("cancel 84");
-        });
-        return lines;
-    }
+    Lines TakeTranscript() { return WithoutListener(driver_.TakeTranscript()); }
     void ExpectFailure(const std::string& text, std::uint32_t index) {
         ExpectThrow<IOException>(text, [index] { PellandoFunctionality_Win64 instrument(nullptr, index); });
         EXPECT_EQ(driver_.OpenFiles(), 0U) << text;
@@ -48,10 +37,8 @@ class UsbIoTest : public DriverTest {
 using UsbIoOpening = UsbIoTest;
 
 TEST_F(UsbIoOpening, ConfiguresTheInstrumentThatWasAskedFor) {
-    std::string configuration = " 00 00 01 00 00 00 00 00 00 00 01 00";
-    for (int i = 0; i < 31 * 8; ++i) {
-        configuration += " 00";
-    }
+    Bytes configuration(260);
+    configuration[2] = configuration[10] = 1;
     const std::string ask = "control 8094206C / [12]";
     Lines expected;
     for (const std::string listed :
@@ -59,7 +46,8 @@ TEST_F(UsbIoOpening, ConfiguresTheInstrumentThatWasAskedFor) {
         expected.insert(expected.end(), {"open " + listed, ask, "close " + listed});
     }
     expected.insert(expected.end(),
-                    {"open usbio/2", ask, "control 80942028 /", "control 80942024" + configuration + " /",
+                    {"open usbio/2", ask, "control 80942028 /",
+                     "control 80942024 " + Hex(configuration.data(), configuration.size()) + " /",
                      "control 8094203C / [8]", "control 80942040 11 00 00 00 00 00 00 00 /"});
     for (const std::string endpoint : {"03", "82", "84"}) {
         expected.insert(expected.end(), {"open usbio/2", ask, "control 80942078 " + endpoint + " /"});
@@ -101,15 +89,9 @@ TEST_F(UsbIoOpening, EachOfItsStepsCanFail) {
         driver_.Script(Control::GetDriverInfo, {.code = 31});
         ExpectFailure(text, 1);
     }
-    const auto failCall = [](std::string_view which, int time) {
-        Platform::InstallCallFilter([which, time](std::string_view call) mutable {
-            return call == which && --time == 0 ? Platform::Errors::NoSystemResources
-                                                : Platform::Errors::Success;
-        });
-    };
-    failCall("MakeList", 2);
+    FailCalls("MakeList", Platform::Errors::NoSystemResources, 2);
     ExpectFailure("Unable to create device list.", 0);
-    failCall("StartThread", 1);
+    FailCalls("StartThread");
     ExpectFailure("could not create interrupt listener thread", 0);
 }
 
