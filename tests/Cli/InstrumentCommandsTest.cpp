@@ -31,10 +31,10 @@ TEST_P(InstrumentCommandsTest, List) {
                                "\",\"name\":\"sim-a\"},{\"identifier\":\"" + Identifier("sim-b") +
                                "\",\"name\":\"sim-b\"}]}\n");
     const Transport other = GetParam() == Transport::Native ? Transport::UsbIo : Transport::Native;
-    Succeed(std::string("identify --transport ") + Name(other) + " --json");
-    EXPECT_EQ(tool_.Json()["identifier"], std::string(Name(other)) + "/sim-a");
-    Succeed("identify --json");
-    EXPECT_EQ(tool_.Json()["identifier"], Identifier("sim-a")) << "the choice was for one command";
+    EXPECT_EQ(JsonOf(std::string("identify --transport ") + Name(other) + " --json")["identifier"],
+              std::string(Name(other)) + "/sim-a");
+    EXPECT_EQ(JsonOf("identify --json")["identifier"], Identifier("sim-a"))
+        << "the choice was for one command";
 }
 
 /// All forms of one readout hold the same values.
@@ -47,8 +47,8 @@ TEST_P(InstrumentCommandsTest, ReadoutForms) {
     ASSERT_EQ(bytes.size(), 256u);
     const auto values = Interface::ReadoutFromBytes(std::span<const std::uint8_t, 256>(bytes.data(), 256));
     host_.Add("sim");  // the same noise once more for each
-    Succeed("readout --json");
-    EXPECT_THAT(tool_.Json()["values"].get<std::vector<int>>(), testing::ElementsAreArray(values));
+    EXPECT_THAT(JsonOf("readout --json")["values"].get<std::vector<int>>(),
+                testing::ElementsAreArray(values));
 
     host_.Add("sim");
     Succeed("readout --csv");
@@ -206,8 +206,7 @@ TEST_P(InstrumentCommandsTest, OutputThatCannotBeWrittenEndsACommandAtOnce) {
 
 TEST_P(InstrumentCommandsTest, IdentifyAndReset) {
     auto& instrument = host_.Add("sim", {.firmware = 305});
-    Succeed("identify --json");
-    auto found = tool_.Json();
+    auto found = JsonOf("identify --json");
     EXPECT_EQ(found["mode"][0], 3);
     EXPECT_EQ(found["parameters"][4], 0x55);
     for (const char* checked : {"mode", "parameters", "cpld"}) {
@@ -217,8 +216,7 @@ TEST_P(InstrumentCommandsTest, IdentifyAndReset) {
                                      {"name", "sim"},
                                      {"chipId", "5a0123456789abcd"},
                                      {"misc", {0x21, 305, 0x43, 0x0506, 0x0708}}}));
-    Succeed("identify");
-    EXPECT_THAT(tool_.Out(), HasSubstr("5a0123456789abcd"));
+    Succeed("identify", "5a0123456789abcd");
     Succeed("reset --code 017");
     instrument.WithCommands([](const Simulator::Commands& commands) {
         EXPECT_EQ(commands.lastResetCode, 17) << "a leading zero means nothing";
@@ -253,8 +251,7 @@ TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
     host_.Add("left");
     host_.Add("right");
     Fail("identify --device up", ExitCode::NoInstrument, Identifier("right"));
-    Succeed("identify --json");
-    EXPECT_EQ(tool_.Json()["name"], "left");
+    EXPECT_EQ(JsonOf("identify --json")["name"], "left");
     EXPECT_THAT(tool_.Err(), HasSubstr("taking " + Identifier("left")));
     for (const std::string& line : std::vector<std::string>{
              "identify --device ight --json",
@@ -284,17 +281,14 @@ TEST_P(InstrumentCommandsTest, ChipsTellInstrumentsApart) {
     host_.Add("right", {.chipId = {1, 2, 3, 4, 5, 6, 7, 8}});
     Succeed("list --chip-id");
     EXPECT_THAT(tool_.Lines()[2], testing::AllOf(HasSubstr("right"), HasSubstr("0102030405060708")));
-    Succeed("identify --device chip:5A0123456789ABCD --json");
-    EXPECT_EQ(tool_.Json()["name"], "left");
+    EXPECT_EQ(JsonOf("identify --device chip:5A0123456789ABCD --json")["name"], "left");
 
     ASSERT_EQ(left.Claim(), Platform::Errors::Success);
-    Succeed("list --chip-id --json");
-    const auto instruments = tool_.Json()["instruments"];
+    const auto instruments = JsonOf("list --chip-id --json")["instruments"];
     EXPECT_EQ(instruments[0]["chipId"], nullptr);
     EXPECT_THAT(instruments[0]["problem"].get<std::string>(), HasSubstr("used by another process"));
     EXPECT_EQ(instruments[1]["chipId"], "0102030405060708");
-    Succeed("identify -d chip:0102030405060708 --json");
-    EXPECT_EQ(tool_.Json()["name"], "right");
+    EXPECT_EQ(JsonOf("identify -d chip:0102030405060708 --json")["name"], "right");
     Fail("identify -d chip:5a0123456789abcd", ExitCode::NotAvailable,
          Identifier("left") + ": the instrument is used");
     left.Release();

@@ -272,31 +272,25 @@ class FullDisk final {
 
 TEST_F(FileTest, AFullDiskLeavesTheWholeRecords) {
     using Form = RecordOutput::Form;
-    struct Case {
-        std::string block;
-        std::uint64_t records;
-        Form form;
-        std::uint64_t kept;
-        std::string content;
-    };
-    for (const Case& row : {
-             Case{"11\n2222\n3\n", 3, Form::Lines, 2, "head\n11\n2222\n"},
-             Case{"11\n222222222222222\n", 2, Form::Lines, 1, "head\n11\n"},
-             Case{"aaaabbbbccccdddd", 4, Form::EqualLength, 2, "head\naaaabbbb"},
-             Case{"one that is not there as a whole", 1, Form::EqualLength, 0, ""},
+    for (const auto& [block, records, form, kept, content] :
+         std::vector<std::tuple<std::string, std::uint64_t, Form, std::uint64_t, std::string>>{
+             {"11\n2222\n3\n", 3, Form::Lines, 2, "head\n11\n2222\n"},
+             {"11\n222222222222222\n", 2, Form::Lines, 1, "head\n11\n"},
+             {"aaaabbbbccccdddd", 4, Form::EqualLength, 2, "head\naaaabbbb"},
+             {"one that is not there as a whole", 1, Form::EqualLength, 0, ""},
          }) {
-        SCOPED_TRACE(row.block);
+        SCOPED_TRACE(block);
         RecordingFile file(path_, none_);
         {
             const FullDisk full;
             file.Append(std::string("head\n"), 0);
             ExpectThrow<FileError>("cannot write " + path_ + ": File too large",
-                                   [&] { file.Append(row.block, row.records, row.form); });
+                                   [&] { file.Append(block, records, form); });
         }
-        EXPECT_EQ(file.Records(), row.kept);
-        EXPECT_EQ(file.KeepWholeRecords().file, row.kept > 0 ? path_ : "");
-        EXPECT_EQ(row.kept > 0 ? Content("f") : "", row.content);
-        EXPECT_EQ(std::filesystem::remove(path_), row.kept > 0);
+        EXPECT_EQ(file.Records(), kept);
+        EXPECT_EQ(file.KeepWholeRecords().file, kept > 0 ? path_ : "");
+        EXPECT_EQ(kept > 0 ? Content("f") : "", content);
+        EXPECT_EQ(std::filesystem::remove(path_), kept > 0);
         EXPECT_EQ(folder_.Files(), Names());
     }
 }

@@ -55,28 +55,25 @@ TEST_P(ScanTest, CsvHasTheNumbersAndTheColumnsThatAreAskedFor) {
     }
     // The first transfer holds two records, or all of them.
     const std::string when = GetParam() == Transport::Native ? "0.2??," : "1.0??,";
-    struct Case {
-        std::string options, head, first;
-    };
-    for (const Case& row : {
-             Case{"", "", values},
-             Case{"--output -", "", values},
-             Case{"--header", names, values},
-             Case{"--header --number", "record," + names, "1," + values},
-             Case{"--header --time", "seconds," + names, when + values},
-             Case{"--number --time", "", "1," + when + values},
+    for (const auto& [options, head, first] : std::vector<std::tuple<std::string, std::string, std::string>>{
+             {"", "", values},
+             {"--output -", "", values},
+             {"--header", names, values},
+             {"--header --number", "record," + names, "1," + values},
+             {"--header --time", "seconds," + names, when + values},
+             {"--number --time", "", "1," + when + values},
          }) {
         host_.Add("sim", Streaming(8 * RecordSize, 2048));
-        Succeed("scan " + row.options);
+        Succeed("scan " + options);
         EXPECT_THAT(tool_.Err(), HasSubstr("8 records of 256 bytes"));
         auto lines = tool_.Lines();
-        if (!row.head.empty()) {
+        if (!head.empty()) {
             ASSERT_FALSE(lines.empty());
-            EXPECT_EQ(lines.front(), row.head);
+            EXPECT_EQ(lines.front(), head);
             lines.erase(lines.begin());
         }
         ASSERT_EQ(lines.size(), 8u);
-        EXPECT_THAT(lines.front(), testing::MatchesRegex(RegexOf(row.first)));
+        EXPECT_THAT(lines.front(), testing::MatchesRegex(RegexOf(first)));
     }
 }
 

@@ -63,9 +63,15 @@ class ToolRunner {
 /// The tool on a host with simulated instruments, on both transports, in virtual time.
 class ToolTest : public testing::TestWithParam<Transport> {
   protected:
-    /// Succeeds, or the test fails with what the tool said.
-    void Succeed(const std::string& line) {
+    /// Succeeds and prints `text`, or the test fails with what the tool said.
+    void Succeed(const std::string& line, const std::string& text = "") {
         EXPECT_EQ(tool_.Run(line), Cli::ExitCode::Success) << line << ": " << tool_.Err();
+        EXPECT_THAT(tool_.Out(), testing::HasSubstr(text)) << line;
+    }
+    /// What it prints with success.
+    nlohmann::json JsonOf(const std::string& line) {
+        Succeed(line);
+        return tool_.Json();
     }
     /// Fails with this code, and tells the user of it with `text`.
     void Fail(const std::string& line, Cli::ExitCode code, const std::string& text = "") {

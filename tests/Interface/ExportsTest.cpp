@@ -131,20 +131,18 @@ TEST_P(Exports, WhatIsThrownBelowThemBecomesACodeAndAText) {
     ScriptedDriver driver;
     const Platform::ScopedDeviceFiles files(driver);
     values_.fill(7);
-    const struct {
-        std::function<void()> fail;
-        std::int32_t code;  ///< of a readout
-        const char* text;
-    } cases[] = {{[] { throw std::runtime_error("why"); }, OSTRA_FAILURE, "why"},
-                 {[] { throw std::out_of_range("why"); }, OSTRA_UNKNOWN_FAILURE, "unknown error"},
-                 {[] { throw 7; }, OSTRA_FAILURE, "unkown exception caught"}};
-    for (const auto& row : cases) {
-        driver.Script(isNative ? 1U : Protocol::BulkInEndpoint, {.onStart = row.fail});
-        EXPECT_EQ(Readout(), row.code);
-        EXPECT_EQ(LastError(), row.text);
-        driver.Script(isNative ? 2U : Protocol::BulkOutEndpoint, {.onStart = row.fail});
+    // The code is that of a readout.
+    const std::vector<std::tuple<std::function<void()>, std::int32_t, const char*>> cases{
+        {[] { throw std::runtime_error("why"); }, OSTRA_FAILURE, "why"},
+        {[] { throw std::out_of_range("why"); }, OSTRA_UNKNOWN_FAILURE, "unknown error"},
+        {[] { throw 7; }, OSTRA_FAILURE, "unkown exception caught"}};
+    for (const auto& [fail, code, text] : cases) {
+        driver.Script(isNative ? 1U : Protocol::BulkInEndpoint, {.onStart = fail});
+        EXPECT_EQ(Readout(), code);
+        EXPECT_EQ(LastError(), text);
+        driver.Script(isNative ? 2U : Protocol::BulkOutEndpoint, {.onStart = fail});
         EXPECT_EQ(WriteImage(""), OSTRA_UNKNOWN_FAILURE);
-        EXPECT_EQ(LastError(), row.text);
+        EXPECT_EQ(LastError(), text);
         EXPECT_THAT(values_, Each(7));
         EXPECT_EQ(driver.OpenFiles(), 0U);
     }

@@ -5,6 +5,7 @@
 #include <functional>
 #include <utility>
 
+#include "Platform/ErrorCodes.h"
 #include "Platform/Threads.h"
 #include "Platform/WaitableObjects.h"
 #include "Printing.h"
@@ -13,6 +14,16 @@ namespace Varnholt::Platform {
 
 /// Longer than any wait that ought to succeed; a test that fails must still end.
 inline constexpr std::uint32_t LongTimeout = 20'000;
+
+/// The code that a call set which did not succeed; the next one must set its own.
+inline ErrorCode ErrorOf(bool succeeded) {
+    const ErrorCode code = LastError();
+    SetLastError(Errors::Success);
+    return succeeded ? Errors::Success : code;
+}
+inline std::pair<WaitResult, std::size_t> Outcome(const WaitAnyResult& result) {
+    return {result.result, result.index};
+}
 
 /// A platform thread with a closure as its body; seen to its end by the destructor.
 class TestThread final {

@@ -20,17 +20,13 @@ TEST_P(Threads, RememberTheirPriority) {
         EXPECT_EQ(CurrentThreadPriority(), level);
         TestThread([] { EXPECT_EQ(CurrentThreadPriority(), 0) << "a priority is one thread's"; }).Join();
     }
-    EXPECT_FALSE(SetCurrentThreadPriority(HighestThreadPriority + 1));
-    EXPECT_EQ(LastError(), Errors::InvalidParameter);
+    EXPECT_EQ(ErrorOf(SetCurrentThreadPriority(HighestThreadPriority + 1)), Errors::InvalidParameter);
     EXPECT_EQ(CurrentThreadPriority(), 0);
 }
 
 TEST_P(Threads, HaveTheirOwnLastError) {
     SetLastError(Errors::Busy);
-    TestThread([] {
-        EXPECT_FALSE(SignalEvent(NoHandle));
-        EXPECT_EQ(LastError(), Errors::InvalidHandle);
-    }).Join();
+    TestThread([] { EXPECT_EQ(ErrorOf(SignalEvent(NoHandle)), Errors::InvalidHandle); }).Join();
     SleepMilliseconds(1);
     EXPECT_EQ(LastError(), Errors::Busy);
 }
@@ -48,8 +44,7 @@ TEST_P(Threads, EndByForceOrSayThatTheyCannot) {
     SignalEvent(leave.Get());
     thread.Join();
     EXPECT_NE(left, isEnded);
-    EXPECT_FALSE(EndThreadByForce(NoHandle, 0));
-    EXPECT_EQ(LastError(), Errors::InvalidHandle);
+    EXPECT_EQ(ErrorOf(EndThreadByForce(NoHandle, 0)), Errors::InvalidHandle);
 }
 
 }  // namespace

@@ -51,26 +51,22 @@ TEST_F(FaultInjectorTest, FaultsOfABulkReadAndWhatComesNext) {
     const Bytes all = Counting(ReadLength, 10);
     Bytes flipped = all;
     flipped[2] ^= 0x08;
-    struct Case {
-        const char* fault;
-        TransferStatus status;
-        Bytes data;
-        Bytes next;  ///< of the next read of the endpoint; empty: it stays pending
-    };
-    for (const Case& test : {
-             Case{"stall", TransferStatus::Stalled, {}, all},
-             Case{"io-error", TransferStatus::IoError, {}, all},
-             Case{"overflow", TransferStatus::Overflow, {}, all},
-             Case{"empty", TransferStatus::Completed, {}, all},
-             Case{"short", TransferStatus::Completed, Counting(32, 10), Counting(32, 42)},
-             Case{"short=60", TransferStatus::Completed, Counting(60, 10), Counting(4, 70)},
-             Case{"short=1000", TransferStatus::Completed, all, {}},
-             Case{"long", TransferStatus::Overflow, all, {}},
-             Case{"stale", TransferStatus::Completed, Counting(ReadLength, 200), all},
-             Case{"flip=19", TransferStatus::Completed, flipped, {}},
+    // Next comes what the endpoint's next read brings; empty: it stays pending.
+    for (const auto& [fault, status, data, next] :
+         std::vector<std::tuple<const char*, TransferStatus, Bytes, Bytes>>{
+             {"stall", TransferStatus::Stalled, {}, all},
+             {"io-error", TransferStatus::IoError, {}, all},
+             {"overflow", TransferStatus::Overflow, {}, all},
+             {"empty", TransferStatus::Completed, {}, all},
+             {"short", TransferStatus::Completed, Counting(32, 10), Counting(32, 42)},
+             {"short=60", TransferStatus::Completed, Counting(60, 10), Counting(4, 70)},
+             {"short=1000", TransferStatus::Completed, all, {}},
+             {"long", TransferStatus::Overflow, all, {}},
+             {"stale", TransferStatus::Completed, Counting(ReadLength, 200), all},
+             {"flip=19", TransferStatus::Completed, flipped, {}},
          }) {
-        SCOPED_TRACE(test.fault);
-        const auto device = Open("bulk-in 1:" + std::string(test.fault));
+        SCOPED_TRACE(fault);
+        const auto device = Open("bulk-in 1:" + std::string(fault));
         const auto read = [&device](TestTransfer&& transfer) {
             EXPECT_EQ(Errors::Success, device->Submit(transfer));
             if (transfer.completions == 0) {
@@ -82,44 +78,38 @@ TEST_F(FaultInjectorTest, FaultsOfABulkReadAndWhatComesNext) {
         AskForMemory(*device, 200);
         EXPECT_EQ(Counting(ReadLength, 200), read(TestTransfer::In(BulkInEndpoint, ReadLength)).second);
         AskForMemory(*device, 10);
-        EXPECT_EQ(std::pair(test.status, test.data), read(TestTransfer::In(BulkInEndpoint, ReadLength)));
-        if (test.status == TransferStatus::Stalled) {
-            EXPECT_EQ(test.status, read(TestTransfer::In(BulkInEndpoint, ReadLength)).first)
+        EXPECT_EQ(std::pair(status, data), read(TestTransfer::In(BulkInEndpoint, ReadLength)));
+        if (status == TransferStatus::Stalled) {
+            EXPECT_EQ(status, read(TestTransfer::In(BulkInEndpoint, ReadLength)).first)
                 << "halted until cleared";
             device->ClearHalt(BulkInEndpoint);
         }
-        EXPECT_EQ(
-            std::pair(test.next.empty() ? TransferStatus::Cancelled : TransferStatus::Completed, test.next),
-            read(TestTransfer::In(BulkInEndpoint, ReadLength)));
+        EXPECT_EQ(std::pair(next.empty() ? TransferStatus::Cancelled : TransferStatus::Completed, next),
+                  read(TestTransfer::In(BulkInEndpoint, ReadLength)));
     }
 }
 
 TEST_F(FaultInjectorTest, FaultsOfABulkWrite) {
     const Bytes sent{0x11, 0x22, 0x33, 0x44};
     const Bytes old = Counting(4);
-    struct Case {
-        const char* fault;
-        TransferStatus status;
-        std::uint32_t moved;
-        Bytes memory;
-    };
-    for (const Case& test : {
-             Case{"stall", TransferStatus::Stalled, 0, old},
-             Case{"io-error", TransferStatus::IoError, 0, old},
-             Case{"overflow", TransferStatus::Overflow, 0, old},
-             Case{"long", TransferStatus::Overflow, 0, old},
-             Case{"empty", TransferStatus::Completed, 0, old},
-             Case{"short=3", TransferStatus::Completed, 3, {0x11, 0x22, 0x33, 3}},
-             Case{"stale", TransferStatus::Completed, 4, {0x99, 0, 0, 0}},
-             Case{"flip=8", TransferStatus::Completed, 4, {0x11, 0x23, 0x33, 0x44}},
-             Case{"gone-before", TransferStatus::DeviceGone, 0, old},
-             Case{"gone-during", TransferStatus::DeviceGone, 2, {0x11, 0x22, 2, 3}},
-             Case{"gone-after", TransferStatus::Completed, 4, sent},
+    for (const auto& [fault, status, moved, memory] :
+         std::vector<std::tuple<const char*, TransferStatus, std::uint32_t, Bytes>>{
+             {"stall", TransferStatus::Stalled, 0, old},
+             {"io-error", TransferStatus::IoError, 0, old},
+             {"overflow", TransferStatus::Overflow, 0, old},
+             {"long", TransferStatus::Overflow, 0, old},
+             {"empty", TransferStatus::Completed, 0, old},
+             {"short=3", TransferStatus::Completed, 3, {0x11, 0x22, 0x33, 3}},
+             {"stale", TransferStatus::Completed, 4, {0x99, 0, 0, 0}},
+             {"flip=8", TransferStatus::Completed, 4, {0x11, 0x23, 0x33, 0x44}},
+             {"gone-before", TransferStatus::DeviceGone, 0, old},
+             {"gone-during", TransferStatus::DeviceGone, 2, {0x11, 0x22, 2, 3}},
+             {"gone-after", TransferStatus::Completed, 4, sent},
          }) {
-        SCOPED_TRACE(test.fault);
+        SCOPED_TRACE(fault);
         SimulatedInstrument& instrument = bus_.Instrument("one");
         instrument.SetEeprom(Counting(Protocol::EepromSize));
-        const auto device = Open("bulk-out 1:" + std::string(test.fault));
+        const auto device = Open("bulk-out 1:" + std::string(fault));
         TestTransfer before = TestTransfer::Memory(Request::WriteEeprom, 100, 1);
         TestTransfer beforeData = TestTransfer::Out(BulkOutEndpoint, {0x99});
         TestTransfer request = TestTransfer::Memory(Request::WriteEeprom, 0, 4);
@@ -127,16 +117,16 @@ TEST_F(FaultInjectorTest, FaultsOfABulkWrite) {
         for (TestTransfer* const each : {&before, &beforeData, &request}) {
             device->Submit(*each);
         }
-        if (std::string(test.fault) == "gone-before") {
+        if (std::string(fault) == "gone-before") {
             EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(data));
             EXPECT_EQ(0, data.completions);
         } else {
             EXPECT_EQ(Errors::Success, device->Submit(data));
             EXPECT_EQ(1, data.completions);
-            EXPECT_EQ(std::pair(test.status, test.moved), std::pair(data.status, data.actualLength));
+            EXPECT_EQ(std::pair(status, moved), std::pair(data.status, data.actualLength));
         }
         const Bytes content = instrument.Eeprom();
-        EXPECT_EQ(test.memory, Bytes(content.begin(), content.begin() + 4));
+        EXPECT_EQ(memory, Bytes(content.begin(), content.begin() + 4));
         EXPECT_EQ(sent, data.buffer) << "the sender's own data stay as they are";
         instrument.PlugIn();
     }

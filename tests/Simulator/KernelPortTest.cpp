@@ -29,26 +29,23 @@ TEST_F(KernelPortTest, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
     const auto port = [](const char* number, bool isFree) {
         return "hs  00" + std::string(number) + (isFree ? Free : Attached);
     };
-    struct Case {
-        std::string first, second;  ///< controllers
-        const char* order;          ///< empty: none is free
-    };
-    for (const Case& test : {
-             Case{port("00", true) + port("01", true) + "ss  0015" + Free, port("30", true), "0 7 65538 3"},
-             Case{port("00", false) + port("01", true), port("30", true), "30 7 65538 3"},
-             Case{port("00", false) + port("01", true), port("30", false), "1 7 65538 3"},
-             Case{"ss  0015" + std::string(Free), port("30", false), ""},
+    // Two controllers, and the order that is given; empty: none is free.
+    for (const auto& [first, second, order] : std::vector<std::tuple<std::string, std::string, const char*>>{
+             {port("00", true) + port("01", true) + "ss  0015" + Free, port("30", true), "0 7 65538 3"},
+             {port("00", false) + port("01", true), port("30", true), "30 7 65538 3"},
+             {port("00", false) + port("01", true), port("30", false), "1 7 65538 3"},
+             {"ss  0015" + std::string(Free), port("30", false), ""},
          }) {
         Write("attach", "");
-        Write("status", Heading + test.first);
-        Write("status.1", Heading + test.second);
-        if (*test.order == '\0') {
+        Write("status", Heading + first);
+        Write("status.1", Heading + second);
+        if (*order == '\0') {
             EXPECT_THROW(PlugIntoKernel(7, 0x10002, folder_), std::runtime_error);
             continue;
         }
-        EXPECT_EQ(std::stoul(test.order), PlugIntoKernel(7, 0x10002, folder_));
+        EXPECT_EQ(std::stoul(order), PlugIntoKernel(7, 0x10002, folder_));
         std::ifstream written(files_.Path("attach"));
-        EXPECT_EQ(test.order, std::string(std::istreambuf_iterator<char>(written), {}));
+        EXPECT_EQ(order, std::string(std::istreambuf_iterator<char>(written), {}));
     }
     std::filesystem::remove(files_.Path("attach"));
     Write("status", Heading + port("00", true));

@@ -52,31 +52,26 @@ class SimulatedInstrumentTest : public testing::Test {
 };
 
 TEST_F(SimulatedInstrumentTest, RefusesWhatItCannotDo) {
-    struct Case {
-        const char* name;
-        SetupPacket setup;
-        Bytes data;
-    };
     const auto out = [](Request request, std::uint16_t value = 0) {
         return SetupPacket{0x40, static_cast<std::uint8_t>(request), value, 0, 0};
     };
     constexpr auto part = &TestTransfer::AddressAndLength;
-    for (const Case& test : {
-             Case{"unknown request", {0x40, 0x99, 0, 0, 0}, {}},
-             Case{"unknown question", {0xC0, 0x99, 0, 0, 8}, Bytes(8)},
-             Case{"class request", {0x21, 0xC0, 0, 0, 0}, {}},
-             Case{"vendor request to an interface", {0x41, 0xC0, 0, 0, 0}, {}},
-             Case{"write across the end", out(Request::WriteEeprom), part(8191, 2)},
-             Case{"write far outside", out(Request::WriteEeprom), part(0xFFFFFFFF, 2)},
-             Case{"read across the end", out(Request::ReadEeprom), part(8128, 128)},
-             Case{"RAM firmware across the end", out(Request::DownloadRamFirmware, 0xFFFF), Bytes(2)},
-             Case{"configuration 2", {0x00, 9, 2, 0, 0}, {}},
-             Case{"device qualifier", {0x80, 6, 0x0600, 0, 10}, Bytes(10)},
+    for (const auto& [name, request, data] : std::vector<std::tuple<const char*, SetupPacket, Bytes>>{
+             {"unknown request", {0x40, 0x99, 0, 0, 0}, {}},
+             {"unknown question", {0xC0, 0x99, 0, 0, 8}, Bytes(8)},
+             {"class request", {0x21, 0xC0, 0, 0, 0}, {}},
+             {"vendor request to an interface", {0x41, 0xC0, 0, 0, 0}, {}},
+             {"write across the end", out(Request::WriteEeprom), part(8191, 2)},
+             {"write far outside", out(Request::WriteEeprom), part(0xFFFFFFFF, 2)},
+             {"read across the end", out(Request::ReadEeprom), part(8128, 128)},
+             {"RAM firmware across the end", out(Request::DownloadRamFirmware, 0xFFFF), Bytes(2)},
+             {"configuration 2", {0x00, 9, 2, 0, 0}, {}},
+             {"device qualifier", {0x80, 6, 0x0600, 0, 10}, Bytes(10)},
          }) {
-        SCOPED_TRACE(test.name);
-        SetupPacket setup = test.setup;
-        setup.length = static_cast<std::uint16_t>(test.data.size());
-        EXPECT_EQ(Bytes(), Do(TestTransfer::Control(setup, test.data), TransferStatus::Stalled));
+        SCOPED_TRACE(name);
+        SetupPacket setup = request;
+        setup.length = static_cast<std::uint16_t>(data.size());
+        EXPECT_EQ(Bytes(), Do(TestTransfer::Control(setup, data), TransferStatus::Stalled));
     }
     // A refused setup does not halt endpoint 0.
     EXPECT_EQ(8U, Do(TestTransfer::VendorQuestion(Request::GetChipId, 8)).size());

@@ -247,13 +247,7 @@ TEST_F(CUsbIoPipeTest, ReadSyncReportsStatusAndBytesMoved) {
     const Bytes data{1, 2, 3, 4};
     const Answer slow{
         .data = data, .after = Never, .count = 99, .cancelledAfter = 60, .cancelledWithData = true};
-    const struct {
-        const char* name;
-        Answer answer;
-        std::uint32_t status;
-        std::uint32_t moved;
-        std::uint32_t milliseconds;
-    } cases[] = {
+    const std::vector<std::tuple<const char*, Answer, std::uint32_t, std::uint32_t, std::uint32_t>> cases{
         {"later", {.data = data, .after = 50}, 0, 4, 50},
         {"short", {.data = {1}, .after = 5}, 0, 1, 5},
         {"empty", {.after = 5}, 0, 0, 5},
@@ -263,16 +257,16 @@ TEST_F(CUsbIoPipeTest, ReadSyncReportsStatusAndBytesMoved) {
         {"cancelled slowly, with more data than there is room for", slow, Status::TimedOut, 4, 160},
         {"more than there is room for", {.data = data, .count = 99}, 0, 4, 0},
     };
-    for (const auto& row : cases) {
-        SCOPED_TRACE(row.name);
-        driver_.Script(BulkInEndpoint, row.answer);
+    for (const auto& [name, answer, status, moved, milliseconds] : cases) {
+        SCOPED_TRACE(name);
+        driver_.Script(BulkInEndpoint, answer);
         Bytes buffer(4, 0xEE), expected(4, 0xEE);
         std::uint32_t size = 4;
         const Tests::Stopwatch stopwatch(clock_);
-        EXPECT_EQ(pipe_.ReadSync(buffer.data(), size, 100), row.status);
-        stopwatch.ExpectBetween(row.milliseconds, row.milliseconds + 1);
-        EXPECT_EQ(size, row.moved);
-        std::copy_n(data.begin(), row.moved, expected.begin());
+        EXPECT_EQ(pipe_.ReadSync(buffer.data(), size, 100), status);
+        stopwatch.ExpectBetween(milliseconds, milliseconds + 1);
+        EXPECT_EQ(size, moved);
+        std::copy_n(data.begin(), moved, expected.begin());
         EXPECT_EQ(buffer, expected);
         EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
     }

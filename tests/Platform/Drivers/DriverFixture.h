@@ -9,6 +9,7 @@
 
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFileSystem.h"
+#include "Platform/TestThread.h"
 #include "Platform/WaitableObjects.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/NativeDriver.h"
@@ -78,13 +79,8 @@ class DriverFixture : public testing::Test {
         return handle;
     }
     Platform::ErrorCode OpenError(const std::string& path) {
-        Platform::SetLastError(0xDEAD);
         const Platform::Handle handle = files_->Open(path);
-        if (handle == Platform::InvalidHandle()) {
-            return Platform::LastError();
-        }
-        files_->CloseFile(handle);
-        return Platform::Errors::Success;
+        return Platform::ErrorOf(handle != Platform::InvalidHandle() && files_->CloseFile(handle));
     }
     Platform::Handle OpenPipe(std::uint32_t number) {
         return Open("native/port1\\PIPE0" + std::to_string(number));
@@ -125,8 +121,7 @@ class DriverFixture : public testing::Test {
     }
     /// Starts a read that must stay pending.
     void StartPending(Platform::Handle file, Bytes& buffer, Request& request) {
-        EXPECT_FALSE(StartRead(file, buffer, request));
-        EXPECT_EQ(Platform::LastError(), Platform::Errors::IoPending);
+        EXPECT_EQ(Platform::ErrorOf(StartRead(file, buffer, request)), Platform::Errors::IoPending);
     }
     Outcome Result(Platform::Handle file, Request& request, bool wait = false) {
         std::uint32_t bytes = 0xDEAD;

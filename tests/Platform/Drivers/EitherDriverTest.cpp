@@ -119,10 +119,7 @@ TEST_P(EitherDriver, AbortEndsTheTransfersOfTheEndpoint) {
 }
 
 TEST_P(EitherDriver, HasACodeForEveryOutcome) {
-    const struct {
-        TransferStatus status;
-        ErrorCode native, usbIo;
-    } cases[] = {
+    const std::vector<std::tuple<TransferStatus, ErrorCode, ErrorCode>> cases{
         {TransferStatus::Completed, 0, 0},
         {TransferStatus::Stalled, 31, 0xE0000030},
         {TransferStatus::IoError, 31, 0xE0000011},
@@ -132,15 +129,15 @@ TEST_P(EitherDriver, HasACodeForEveryOutcome) {
     };
     const auto main = OpenMain();
     const auto in = OpenEndpoint(BulkInEndpoint);
-    for (const auto& row : cases) {
-        SCOPED_TRACE(static_cast<int>(row.status));
+    for (const auto& [status, native, usbIo] : cases) {
+        SCOPED_TRACE(static_cast<int>(status));
         Bytes buffer(16, 0x77), data{1, 2};
-        device_->AnswerAtOnce(row.status, 5);
-        EXPECT_EQ(Read(in, buffer), (Outcome{Code(row.native, row.usbIo), 5}));
+        device_->AnswerAtOnce(status, 5);
+        EXPECT_EQ(Read(in, buffer), (Outcome{Code(native, usbIo), 5}));
         EXPECT_EQ(buffer[4], 4) << "what has moved counts, whatever the end";
-        device_->AnswerAtOnce(row.status, 1);
-        const bool isGone = row.status == TransferStatus::DeviceGone && !IsNative();
-        EXPECT_EQ(Vendor(main, 0xC0, false, data), (Outcome{Code(row.native, row.usbIo), isGone ? 0U : 1U}));
+        device_->AnswerAtOnce(status, 1);
+        const bool isGone = status == TransferStatus::DeviceGone && !IsNative();
+        EXPECT_EQ(Vendor(main, 0xC0, false, data), (Outcome{Code(native, usbIo), isGone ? 0U : 1U}));
     }
     EXPECT_EQ(device_->clearedHalts, Bytes{BulkInEndpoint}) << "no halt outlasts what comes next";
 }

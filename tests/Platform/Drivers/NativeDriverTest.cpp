@@ -53,29 +53,24 @@ TEST_F(NativeDriver, RefusesWhatAFileDoesNotTake) {
     constexpr std::uint32_t Vendor = Native::ControlVendorRequest, Abort = Native::ControlAbortPipe;
     const auto main = Open("native/port1");
     const auto good = NativeBlock(0xC0, 0);
-    const struct {
-        const char* name;
-        std::uint32_t code;
-        Bytes input;
-        std::size_t outputSize;
-        Platform::ErrorCode error;
-    } controls[] = {
-        {"unknown code", 0x220005, good, 0, Errors::InvalidFunction},
-        {"no block", Vendor, {}, 0, Errors::InvalidParameter},
-        {"short block", Vendor, Bytes(9), 0, Errors::InvalidParameter},
-        {"long block", Vendor, Bytes(11), 0, Errors::InvalidParameter},
-        {"direction 2", Vendor, NativeBlock(0xC0, 2), 0, Errors::InvalidParameter},
-        {"type 0", Vendor, NativeBlock(0xC0, 0, 0, 0, 0), 0, Errors::InvalidParameter},
-        {"recipient 1", Vendor, NativeBlock(0xC0, 0, 0, 0, 2, 1), 0, Errors::InvalidParameter},
-        {"data beyond a setup packet's length", Vendor, good, 65536, Errors::InvalidParameter},
-        {"abort without a block", Abort, {}, 0, Errors::InvalidParameter},
-        {"abort of an unknown endpoint", Abort, NativeBlock(0, 0, 0x85), 0, Errors::InvalidParameter},
-        {"abort beyond a byte", Abort, NativeBlock(0, 0, 0x184), 0, Errors::InvalidParameter},
-    };
+    const std::vector<std::tuple<const char*, std::uint32_t, Bytes, std::size_t, Platform::ErrorCode>>
+        controls{
+            {"unknown code", 0x220005, good, 0, Errors::InvalidFunction},
+            {"no block", Vendor, {}, 0, Errors::InvalidParameter},
+            {"short block", Vendor, Bytes(9), 0, Errors::InvalidParameter},
+            {"long block", Vendor, Bytes(11), 0, Errors::InvalidParameter},
+            {"direction 2", Vendor, NativeBlock(0xC0, 2), 0, Errors::InvalidParameter},
+            {"type 0", Vendor, NativeBlock(0xC0, 0, 0, 0, 0), 0, Errors::InvalidParameter},
+            {"recipient 1", Vendor, NativeBlock(0xC0, 0, 0, 0, 2, 1), 0, Errors::InvalidParameter},
+            {"data beyond a setup packet's length", Vendor, good, 65536, Errors::InvalidParameter},
+            {"abort without a block", Abort, {}, 0, Errors::InvalidParameter},
+            {"abort of an unknown endpoint", Abort, NativeBlock(0, 0, 0x85), 0, Errors::InvalidParameter},
+            {"abort beyond a byte", Abort, NativeBlock(0, 0, 0x184), 0, Errors::InvalidParameter},
+        };
     Bytes data(4);
-    for (const auto& row : controls) {
-        Bytes output(row.outputSize);
-        EXPECT_EQ(Control(main, row.code, row.input, output).code, row.error) << row.name;
+    for (const auto& [name, code, input, outputSize, error] : controls) {
+        Bytes output(outputSize);
+        EXPECT_EQ(Control(main, code, input, output).code, error) << name;
     }
     for (const std::uint32_t pipe : {1U, 2U, 3U}) {
         EXPECT_EQ(Control(OpenPipe(pipe), Vendor, good).code, Errors::InvalidFunction) << pipe;

@@ -3,6 +3,7 @@
 
 #include "Platform/Drivers/DriverFixture.h"
 #include "Platform/EventScheduler.h"
+#include "Platform/TestThread.h"
 #include "Platform/Threads.h"
 #include "Support/FailCalls.h"
 
@@ -11,6 +12,7 @@ namespace {
 
 namespace Errors = Platform::Errors;
 namespace Native = Protocol::NativeDriver;
+using Platform::ErrorOf;
 using Platform::WaitResult;
 
 constexpr std::uint8_t In = Protocol::BulkInEndpoint;
@@ -30,8 +32,7 @@ TEST_F(OverlappedFiles, SignalAtCompletionAndResetAtStart) {
     EXPECT_FALSE(request_.TakeSignal()) << "a signal from before the start";
     EXPECT_EQ(Result(pipe_, request_), (Outcome{Errors::IoIncomplete, 0}));
     Bytes other(8);
-    EXPECT_FALSE(StartRead(pipe_, other, request_)) << "its record runs";
-    EXPECT_EQ(Platform::LastError(), Errors::InvalidParameter);
+    EXPECT_EQ(ErrorOf(StartRead(pipe_, other, request_)), Errors::InvalidParameter) << "its record runs";
     device_->Send(In, {1, 2, 3});
     EXPECT_EQ(Platform::Wait(request_.event.Get(), 1000), WaitResult::Signalled);
     EXPECT_EQ(Result(pipe_, request_), (Outcome{0, 3}));
@@ -145,14 +146,10 @@ TEST_F(OverlappedFiles, RefuseHandlesThatNameNothing) {
         EXPECT_EQ(Write(handle, buffer_).code, Errors::InvalidHandle);
         EXPECT_EQ(Control(handle, Native::ControlVendorRequest, NativeBlock(0xC0, 0)).code,
                   Errors::InvalidHandle);
-        EXPECT_FALSE(files_->CancelTransfers(handle));
-        EXPECT_EQ(Platform::LastError(), Errors::InvalidHandle);
-        Platform::SetLastError(0);
-        EXPECT_FALSE(files_->CloseFile(handle));
-        EXPECT_EQ(Platform::LastError(), Errors::InvalidHandle);
+        EXPECT_EQ(ErrorOf(files_->CancelTransfers(handle)), Errors::InvalidHandle);
+        EXPECT_EQ(ErrorOf(files_->CloseFile(handle)), Errors::InvalidHandle);
     }
-    EXPECT_FALSE(files_->StartRead(reopened, nullptr, 1, request_.record));
-    EXPECT_EQ(Platform::LastError(), Errors::InvalidParameter);
+    EXPECT_EQ(ErrorOf(files_->StartRead(reopened, nullptr, 1, request_.record)), Errors::InvalidParameter);
     EXPECT_FALSE(Platform::Close(reopened)) << "not a waitable object";
     EXPECT_EQ(Platform::Wait(reopened, 0), WaitResult::Failed);
 }

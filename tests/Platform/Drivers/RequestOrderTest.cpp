@@ -22,28 +22,24 @@ class RequestOrder : public DriverFixture {
 
 // Every order in which acceptance, cancellation and completion of one read can meet.
 TEST_F(RequestOrder, EndsOnceInEveryOrder) {
-    struct Case {
-        const char* name;
-        std::string inSubmit;  ///< what happens there: c cancelled, d done, r refused
-        bool endedByCancel;    ///< as soon as the device is told of it, with three bytes
-        Outcome outcome;
-        int cancels;
-    };
+    // In the submission it is cancelled (c), done (d), refused (r). A cancellation that ends it does so with
+    // three bytes, as soon as the device is told.
     const auto main = Open("native/port1");
-    for (const Case& row : {
-             Case{"completed in submit", "d", false, {0, 8}, 0},
-             Case{"cancelled before it was accepted", "c", true, {Errors::OperationAborted, 3}, 1},
-             Case{"cancelled, then completed, in submit", "cd", false, {0, 8}, 0},
-             Case{"cancelled, then refused", "cr", false, {Errors::GeneralFailure, 0}, 0},
-             Case{"cancelled before accepted, completed later", "c", false, {0, 8}, 1},
+    for (const auto& [name, inSubmit, endedByCancel, outcome, cancels] :
+         std::vector<std::tuple<const char*, std::string, bool, Outcome, int>>{
+             {"completed in submit", "d", false, {0, 8}, 0},
+             {"cancelled before it was accepted", "c", true, {Errors::OperationAborted, 3}, 1},
+             {"cancelled, then completed, in submit", "cd", false, {0, 8}, 0},
+             {"cancelled, then refused", "cr", false, {Errors::GeneralFailure, 0}, 0},
+             {"cancelled before accepted, completed later", "c", false, {0, 8}, 1},
          }) {
-        SCOPED_TRACE(row.name);
-        const bool refused = row.inSubmit.ends_with('r');
-        const bool atOnce = row.inSubmit.ends_with('d');
+        SCOPED_TRACE(name);
+        const bool refused = inSubmit.ends_with('r');
+        const bool atOnce = inSubmit.ends_with('d');
         Transfer* running = nullptr;
         device_->cancellations = 0;
         device_->onSubmit = [&](Transfer& transfer) {
-            if (row.inSubmit.starts_with('c')) {
+            if (inSubmit.starts_with('c')) {
                 Control(main, Protocol::NativeDriver::ControlAbortPipe,
                         NativeBlock(0, 0, Protocol::BulkInEndpoint));
             }
@@ -59,22 +55,22 @@ TEST_F(RequestOrder, EndsOnceInEveryOrder) {
         };
         device_->onCancel = [&](Transfer& transfer) {
             EXPECT_EQ(&transfer, running) << "cancelled what the device does not have";
-            if (row.endedByCancel) {
+            if (endedByCancel) {
                 running = nullptr;
                 Complete(transfer, TransferStatus::Cancelled, 3);
             }
         };
         Request request;
         EXPECT_EQ(StartRead(pipe_, buffer_, request), atOnce);
-        EXPECT_TRUE(atOnce || Platform::LastError() == (refused ? row.outcome.code : Errors::IoPending))
+        EXPECT_TRUE(atOnce || Platform::LastError() == (refused ? outcome.code : Errors::IoPending))
             << Platform::LastError();
         if (running != nullptr) {
             Complete(*running, TransferStatus::Completed, 8);
         }
-        EXPECT_EQ(Result(pipe_, request), row.outcome);
+        EXPECT_EQ(Result(pipe_, request), outcome);
         EXPECT_EQ(request.TakeSignal(), !refused);
         EXPECT_FALSE(request.TakeSignal()) << "signalled twice";
-        EXPECT_EQ(device_->cancellations, row.cancels);
+        EXPECT_EQ(device_->cancellations, cancels);
     }
 }
 

@@ -49,9 +49,8 @@ TEST(NamedMutexes, ExcludeOtherProcessesUntilTheLastRelease) {
         stage.SayGo();
     }
     const OwnedHandle event(MakeAutoResetEvent());
-    const WaitAnyResult outcome = WaitAny(std::array{event.Get(), stage.mutex.Get()}, LongTimeout);
-    EXPECT_EQ(outcome.result, WaitResult::Signalled);
-    EXPECT_EQ(outcome.index, 1u);
+    EXPECT_EQ(Outcome(WaitAny(std::array{event.Get(), stage.mutex.Get()}, LongTimeout)),
+              std::pair(WaitResult::Signalled, std::size_t{1}));
     EXPECT_EQ(holder.WaitForExit(), 0);
     EXPECT_TRUE(ReleaseMutex(stage.mutex.Get()));
 }

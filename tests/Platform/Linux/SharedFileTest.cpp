@@ -13,6 +13,7 @@
 #include "Platform/ErrorCodes.h"
 #include "Platform/Linux/SharedFile.h"
 #include "Platform/WaitableObjects.h"
+#include "TestThread.h"
 #include "UniqueName.h"
 
 namespace Varnholt::Platform {
@@ -60,9 +61,7 @@ TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
         std::ofstream(path_) << content;
         const int user = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
         ASSERT_EQ(flock(user, LOCK_SH), 0);
-        SetLastError(Errors::Success);
-        EXPECT_EQ(MakeMutex(name_), NoHandle);
-        EXPECT_EQ(LastError(), Errors::InvalidData);
+        EXPECT_EQ(ErrorOf(MakeMutex(name_) != NoHandle), Errors::InvalidData);
         close(user);
         EXPECT_TRUE(CanBeUsed(OwnedHandle(MakeMutex(name_))));
         EXPECT_FALSE(std::filesystem::exists(path_));
@@ -70,10 +69,7 @@ TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
 }
 
 TEST_F(SharedFiles, ThatAreNoFilesOfOursAreRefused) {
-    struct {
-        const char* text;
-        std::function<bool(const std::string&)> make;
-    } const cases[] = {
+    const std::vector<std::pair<const char*, std::function<bool(const std::string&)>>> cases{
         {"link", [](const std::string& file) { return symlink("/dev/null", file.c_str()) == 0; }},
         {"directory", [](const std::string& file) { return mkdir(file.c_str(), 0700) == 0; }},
         {"named pipe", [](const std::string& file) { return mkfifo(file.c_str(), 0600) == 0; }},
@@ -83,15 +79,13 @@ TEST_F(SharedFiles, ThatAreNoFilesOfOursAreRefused) {
              return chown(file.c_str(), 1, 1) == 0;
          }},
     };
-    for (const auto& found : cases) {
-        SCOPED_TRACE(found.text);
-        if (!found.make(path_)) {
+    for (const auto& [text, make] : cases) {
+        SCOPED_TRACE(text);
+        if (!make(path_)) {
             EXPECT_NE(geteuid(), 0u);  // only root can give a file away
             continue;
         }
-        SetLastError(Errors::Success);
-        EXPECT_EQ(MakeMutex(name_), NoHandle);
-        EXPECT_EQ(LastError(), Errors::AccessDenied);
+        EXPECT_EQ(ErrorOf(MakeMutex(name_) != NoHandle), Errors::AccessDenied);
         std::filesystem::remove(path_);
     }
 }
@@ -113,23 +107,15 @@ TEST_F(SharedFiles, ThatAreLockedAreBusy) {
     std::ofstream{path_};
     const int user = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
     ASSERT_EQ(flock(user, LOCK_EX), 0);
-    EXPECT_EQ(MakeMutex(name_), NoHandle);
-    EXPECT_EQ(LastError(), Errors::Busy);
+    EXPECT_EQ(ErrorOf(MakeMutex(name_) != NoHandle), Errors::Busy);
     close(user);
 }
 
 TEST(SharedFileNames, AreFileNamesOfBoundedLengthAndDiffer) {
-    const std::string names[] = {"a",
-                                 "A",
-                                 "a/b",
-                                 "a%2Fb",
-                                 "..",
-                                 R"(\\?\usb#vid_04b4&pid_8613#5&1c&0&2#{00873fdf-61a8-11d1})",
-                                 std::string(500, '/'),
-                                 std::string(500, '/') + "a",
-                                 std::string(500, '/') + "b"};
+    const std::string path = R"(\\?\usb#vid_04b4&pid_8613#5&1c&0&2#{00873fdf-61a8-11d1})", slashes(500, '/');
     std::set<std::string> fileNames;
-    for (const std::string& name : names) {
+    for (const std::string& name : {std::string("a"), std::string("A"), std::string("a/b"),
+                                    std::string("a%2Fb"), path, slashes, slashes + "a", slashes + "b"}) {
         const std::string fileName = SharedFile::FileNameOf("mutex", name);
         EXPECT_EQ(fileName.find('/'), std::string::npos) << fileName;
         EXPECT_LE(fileName.size(), 200u);

@@ -8,6 +8,7 @@
 
 #include "Platform/ErrorCodes.h"
 #include "Platform/Linux/UserDirectory.h"
+#include "TestThread.h"
 #include "UniqueName.h"
 
 namespace Varnholt::Platform {
@@ -26,10 +27,7 @@ class UserDirectories : public testing::Test {
 };
 
 TEST_F(UserDirectories, AreFoundBesideWhatOthersPutInTheirPlace) {
-    struct {
-        const char* text;
-        std::function<bool(const std::string&)> make;
-    } const squatters[] = {
+    const std::vector<std::pair<const char*, std::function<bool(const std::string&)>>> squatters{
         {"file", [](const std::string& name) { return std::ofstream(name).is_open(); }},
         {"named pipe", [](const std::string& name) { return mkfifo(name.c_str(), 0600) == 0; }},
         {"link to a directory of ours",
@@ -43,9 +41,9 @@ TEST_F(UserDirectories, AreFoundBesideWhatOthersPutInTheirPlace) {
     };
     std::string expected = first_;
     int taken = 0;
-    for (const auto& squatter : squatters) {
-        SCOPED_TRACE(squatter.text);
-        if (!squatter.make(expected)) {
+    for (const auto& [text, make] : squatters) {
+        SCOPED_TRACE(text);
+        if (!make(expected)) {
             EXPECT_NE(geteuid(), 0u);  // only root can give a directory away
             break;
         }
@@ -65,10 +63,8 @@ TEST_F(UserDirectories, AreFoundBesideWhatOthersPutInTheirPlace) {
 
 TEST_F(UserDirectories, SayWhyTheyCannotBeHad) {
     std::ofstream{above_ + "/file"};
-    EXPECT_FALSE(UserDirectory::Open(above_ + "/nothing"));
-    EXPECT_EQ(LastError(), Errors::FileNotFound);
-    EXPECT_FALSE(UserDirectory::Open(above_ + "/file"));
-    EXPECT_EQ(LastError(), Errors::PathNotFound);
+    EXPECT_EQ(ErrorOf(UserDirectory::Open(above_ + "/nothing") != nullptr), Errors::FileNotFound);
+    EXPECT_EQ(ErrorOf(UserDirectory::Open(above_ + "/file") != nullptr), Errors::PathNotFound);
 }
 
 }  // namespace

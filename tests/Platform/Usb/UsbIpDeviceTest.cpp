@@ -124,19 +124,14 @@ TEST_F(UsbIpDeviceTest, ImportAndPacketsAreWhatTheProtocolSays) {
 }
 
 TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
-    struct Case {
-        const char* name;
-        std::optional<std::int32_t> submitStatus;  ///< answered although the unlink has arrived
-        Bytes data;
-        std::int32_t unlinkStatus;
-        TransferStatus expected;
-    };
+    // With a status of the submission it is answered although the unlink has arrived.
     const auto device = MakeClaimedDevice();
-    for (const Case& test : {
-             Case{"unlinked", std::nullopt, {}, -104, TransferStatus::Cancelled},
-             Case{"answered meanwhile", 0, {1, 2, 3, 4}, 0, TransferStatus::Completed},
-             Case{"unlinked with data", -104, {1, 2}, 0, TransferStatus::Cancelled},
-             Case{"the peer believes it has answered", std::nullopt, {}, 0, TransferStatus::Cancelled},
+    for (const auto& [name, submitStatus, data, unlinkStatus, expected] : std::vector<
+             std::tuple<const char*, std::optional<std::int32_t>, Bytes, std::int32_t, TransferStatus>>{
+             {"unlinked", std::nullopt, {}, -104, TransferStatus::Cancelled},
+             {"answered meanwhile", 0, {1, 2, 3, 4}, 0, TransferStatus::Completed},
+             {"unlinked with data", -104, {1, 2}, 0, TransferStatus::Cancelled},
+             {"the peer believes it has answered", std::nullopt, {}, 0, TransferStatus::Cancelled},
          }) {
         TestTransfer transfer = TestTransfer::In(BulkInEndpoint, 4);
         ASSERT_EQ(Errors::Success, device->Submit(transfer));
@@ -144,16 +139,15 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
         device->Cancel(transfer);
         device->Cancel(transfer);
         const auto unlink = PeerReceivesPacket<UsbIp::UnlinkPacket>();
-        EXPECT_EQ(submit.sequence, unlink.victim) << test.name;
-        if (test.submitStatus) {
-            const auto length = static_cast<std::uint32_t>(test.data.size());
-            PeerSends(Join(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, *test.submitStatus, length}),
-                           test.data));
+        EXPECT_EQ(submit.sequence, unlink.victim) << name;
+        if (submitStatus) {
+            const auto length = static_cast<std::uint32_t>(data.size());
+            PeerSends(Join(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, *submitStatus, length}), data));
         }
-        PeerSends(UsbIp::Encode(UsbIp::UnlinkReply{unlink.sequence, test.unlinkStatus}));
-        ASSERT_TRUE(transfer.Wait()) << test.name;
-        EXPECT_EQ(test.expected, transfer.status) << test.name;
-        EXPECT_EQ(test.data, transfer.Data()) << test.name;
+        PeerSends(UsbIp::Encode(UsbIp::UnlinkReply{unlink.sequence, unlinkStatus}));
+        ASSERT_TRUE(transfer.Wait()) << name;
+        EXPECT_EQ(expected, transfer.status) << name;
+        EXPECT_EQ(data, transfer.Data()) << name;
         device->Cancel(transfer);
     }
     // The connection has survived it, and nothing more was sent.

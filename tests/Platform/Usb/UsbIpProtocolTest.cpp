@@ -21,36 +21,30 @@ Bytes Part(const Array& array, std::size_t start, std::size_t length) {
 }
 
 TEST(UsbIpProtocolTest, PacketsHaveTheirFieldsWhereAKernelLooksForThem) {
-    struct Case {
-        const char* name;
-        UsbIp::Packet packet;
-        Bytes start;  ///< the rest of the 48 bytes is zero
-    };
+    // Behind these bytes the rest of the 48 is zero.
     const UsbIp::SubmitPacket control{0x01020304, 0x10002, 0, 8, 0, {0x40, 0xC1, 0x1122, 0x3344, 8}, false};
     const UsbIp::SubmitPacket bulkIn{5, 0x10002, 0x82, 0x10000, 0, {}, true};
-    for (const Case& test : {
-             Case{"control out",
-                  control,
-                  {0,    0,    0,    1,    1,    2,    3, 4, 0, 1, 0, 2, 0, 0, 0, 0, 0, 0, 0, 0,  //
-                   0,    0,    0,    0,    0,    0,    0, 8, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0,  //
-                   0x40, 0xC1, 0x22, 0x11, 0x44, 0x33, 8, 0}},
-             Case{"bulk in", bulkIn, {0, 0, 0, 1, 0, 0, 0, 5, 0, 1, 0, 2, 0, 0, 0, 1, 0, 0, 0, 2,  //
-                                      0, 0, 2, 0, 0, 1, 0, 0}},
-             Case{"unlink", UsbIp::UnlinkPacket{7, 0x00010002, 5}, {0, 0, 0, 2, 0, 0, 0, 7, 0, 1, 0, 2,
-                                                                    0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 5}},
-             Case{"submit reply",
-                  UsbIp::SubmitReply{5, -32, 0x100},
-                  {0, 0, 0, 3, 0, 0, 0,    5,    0,    0,    0, 0, 0, 0,
-                   0, 0, 0, 0, 0, 0, 0xFF, 0xFF, 0xFF, 0xE0, 0, 0, 1, 0}},
-             Case{"unlink reply",
-                  UsbIp::UnlinkReply{7, -104},
-                  {0, 0, 0, 4, 0, 0, 0, 7, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0xFF, 0xFF, 0xFF, 0x98}},
+    for (const auto& [name, packet, start] : std::vector<std::tuple<const char*, UsbIp::Packet, Bytes>>{
+             {"control out",
+              control,
+              {0,    0,    0,    1,    1,    2,    3, 4, 0, 1, 0, 2, 0, 0, 0, 0, 0, 0, 0, 0,  //
+               0,    0,    0,    0,    0,    0,    0, 8, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0,  //
+               0x40, 0xC1, 0x22, 0x11, 0x44, 0x33, 8, 0}},
+             {"bulk in", bulkIn, {0, 0, 0, 1, 0, 0, 0, 5, 0, 1, 0, 2, 0, 0, 0, 1, 0, 0, 0, 2,  //
+                                  0, 0, 2, 0, 0, 1, 0, 0}},
+             {"unlink", UsbIp::UnlinkPacket{7, 0x00010002, 5}, {0, 0, 0, 2, 0, 0, 0, 7, 0, 1, 0, 2,
+                                                                0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 5}},
+             {"submit reply", UsbIp::SubmitReply{5, -32, 0x100}, {0,    0,    0,    3,    0, 0, 0, 5, 0, 0,
+                                                                  0,    0,    0,    0,    0, 0, 0, 0, 0, 0,
+                                                                  0xFF, 0xFF, 0xFF, 0xE0, 0, 0, 1, 0}},
+             {"unlink reply", UsbIp::UnlinkReply{7, -104}, {0, 0, 0, 4, 0, 0, 0, 7, 0,    0,    0,    0,
+                                                            0, 0, 0, 0, 0, 0, 0, 0, 0xFF, 0xFF, 0xFF, 0x98}},
          }) {
-        Bytes expected = test.start;
+        Bytes expected = start;
         expected.resize(48);
-        const UsbIp::PacketBytes bytes = UsbIp::Encode(test.packet);
-        EXPECT_EQ(expected, Part(bytes, 0, 48)) << test.name;
-        EXPECT_EQ(test.packet, UsbIp::DecodePacket(bytes)) << test.name;
+        const UsbIp::PacketBytes bytes = UsbIp::Encode(packet);
+        EXPECT_EQ(expected, Part(bytes, 0, 48)) << name;
+        EXPECT_EQ(packet, UsbIp::DecodePacket(bytes)) << name;
     }
 }
 
@@ -58,25 +52,20 @@ TEST(UsbIpProtocolTest, RefusesPacketsThatCannotBeServed) {
     const UsbIp::PacketBytes good =
         UsbIp::Encode(UsbIp::SubmitPacket{1, 0, 0x82, UsbIp::MaximumPayload, 0, {}, true});
     ASSERT_TRUE(UsbIp::DecodePacket(good));
-    struct Case {
-        const char* name;
-        std::size_t offset;
-        std::uint8_t value;
-        bool accepted;
-    };
-    for (const Case& test : {
-             Case{"unknown command", 3, 5, false},
-             Case{"command 0", 3, 0, false},
-             Case{"direction", 15, 2, false},
-             Case{"endpoint number", 19, 16, false},
-             Case{"endpoint's high byte", 16, 1, false},
-             Case{"one byte too long", 0x1B, 1, false},
-             Case{"isochronous", 0x23, 1, false},
-             Case{"flags do not matter", 0x17, 0xFF, true},
+    for (const auto& [name, offset, value, accepted] :
+         std::vector<std::tuple<const char*, std::size_t, std::uint8_t, bool>>{
+             {"unknown command", 3, 5, false},
+             {"command 0", 3, 0, false},
+             {"direction", 15, 2, false},
+             {"endpoint number", 19, 16, false},
+             {"endpoint's high byte", 16, 1, false},
+             {"one byte too long", 0x1B, 1, false},
+             {"isochronous", 0x23, 1, false},
+             {"flags do not matter", 0x17, 0xFF, true},
          }) {
         UsbIp::PacketBytes bytes = good;
-        bytes[test.offset] = test.value;
-        EXPECT_EQ(test.accepted, UsbIp::DecodePacket(bytes).has_value()) << test.name;
+        bytes[offset] = value;
+        EXPECT_EQ(accepted, UsbIp::DecodePacket(bytes).has_value()) << name;
     }
     UsbIp::PacketBytes noPackets = good;
     std::fill_n(noPackets.begin() + 0x20, 4, std::uint8_t{0xFF});
@@ -126,31 +115,27 @@ TEST(UsbDescriptorsTest, OnlyTheFirstInterfaceCountsAndBrokenOnesEndTheSearch) {
     const Bytes alternate1{9, 4, 0, 1, 1, 0xFF, 0, 0, 0};
     const Bytes bulk{7, 5, 0x82, 2, 0x00, 0x02, 0}, interrupt{7, 5, 0x84, 3, 0x08, 0x00, 4};
     const std::string foundBulk = "82 2 512;", foundInterrupt = "84 3 8;";
-    struct Case {
-        const char* name;
-        std::vector<Bytes> parts;
-        std::string endpoints;
-    };
-    for (const Case& test : {
-             Case{"nothing", {}, ""},
-             Case{"two endpoints", {interface0, bulk, interrupt}, foundBulk + foundInterrupt},
-             Case{"other settings", {interface0, bulk, alternate1, interrupt}, foundBulk},
-             Case{"other interfaces", {interface1, bulk, interface0, interrupt}, foundInterrupt},
-             Case{"no interface", {bulk}, ""},
-             Case{"unknown descriptor between", {interface0, {3, 0x99, 7}, bulk}, foundBulk},
-             Case{"length 0", {interface0, {0, 5}, bulk}, ""},
-             Case{"length 1", {interface0, {1}, bulk}, ""},
-             Case{"an interface of 2 bytes", {interface0, {2, 4}, bulk}, foundBulk},
-             Case{"an interface of 3 bytes", {interface0, {3, 4, 0}, bulk}, foundBulk},
-             Case{"an interface of 4 bytes", {{4, 4, 0, 0}, bulk}, foundBulk},
-             Case{"an endpoint of 2 bytes", {interface0, {2, 5}, bulk}, foundBulk},
-             Case{"an endpoint of 5 bytes", {interface0, {5, 5, 0x84, 3, 8}, bulk}, foundBulk},
-             Case{"an endpoint of 6 bytes", {interface0, {6, 5, 0x84, 3, 8, 0}}, foundInterrupt},
-             Case{"longer than what there is", {interface0, bulk, {7, 5, 0x84, 3, 8, 0}}, foundBulk},
-             Case{"a length at the end", {interface0, bulk, {7}}, foundBulk},
+    for (const auto& [name, parts, expected] :
+         std::vector<std::tuple<const char*, std::vector<Bytes>, std::string>>{
+             {"nothing", {}, ""},
+             {"two endpoints", {interface0, bulk, interrupt}, foundBulk + foundInterrupt},
+             {"other settings", {interface0, bulk, alternate1, interrupt}, foundBulk},
+             {"other interfaces", {interface1, bulk, interface0, interrupt}, foundInterrupt},
+             {"no interface", {bulk}, ""},
+             {"unknown descriptor between", {interface0, {3, 0x99, 7}, bulk}, foundBulk},
+             {"length 0", {interface0, {0, 5}, bulk}, ""},
+             {"length 1", {interface0, {1}, bulk}, ""},
+             {"an interface of 2 bytes", {interface0, {2, 4}, bulk}, foundBulk},
+             {"an interface of 3 bytes", {interface0, {3, 4, 0}, bulk}, foundBulk},
+             {"an interface of 4 bytes", {{4, 4, 0, 0}, bulk}, foundBulk},
+             {"an endpoint of 2 bytes", {interface0, {2, 5}, bulk}, foundBulk},
+             {"an endpoint of 5 bytes", {interface0, {5, 5, 0x84, 3, 8}, bulk}, foundBulk},
+             {"an endpoint of 6 bytes", {interface0, {6, 5, 0x84, 3, 8, 0}}, foundInterrupt},
+             {"longer than what there is", {interface0, bulk, {7, 5, 0x84, 3, 8, 0}}, foundBulk},
+             {"a length at the end", {interface0, bulk, {7}}, foundBulk},
          }) {
         Bytes all;
-        for (const Bytes& part : test.parts) {
+        for (const Bytes& part : parts) {
             all.insert(all.end(), part.begin(), part.end());
         }
         std::string endpoints;
@@ -158,7 +143,7 @@ TEST(UsbDescriptorsTest, OnlyTheFirstInterfaceCountsAndBrokenOnesEndTheSearch) {
             endpoints += Tests::Hex(&endpoint.address, 1) + " " + std::to_string(endpoint.attributes) + " " +
                          std::to_string(endpoint.maximumPacketSize) + ";";
         }
-        EXPECT_EQ(test.endpoints, endpoints) << test.name;
+        EXPECT_EQ(expected, endpoints) << name;
     }
 }
 

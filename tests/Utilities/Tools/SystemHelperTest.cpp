@@ -15,10 +15,7 @@ struct SystemHelper : testing::Test {
 };
 
 TEST_F(SystemHelper, DescribesEditionServicePackAndBuild) {
-    const struct {
-        Platform::VersionRecord record;
-        std::string description;
-    } cases[] = {
+    const std::vector<std::tuple<Platform::VersionRecord, std::string>> cases{
         {{0, 3, 10, 7, ""}, "Microsoft Windows 3.1 / Win32s  (Build 7)"},
         {{1, 4, 0, 0x040003B6, ""}, "Microsoft Windows 95  (Build 950)"},
         {{1, 4, 10, 0x040A08AE, " A "}, "Microsoft Windows 98  A  (Build 2222)"},
@@ -30,10 +27,10 @@ TEST_F(SystemHelper, DescribesEditionServicePackAndBuild) {
         {{2, 6, 1, 7601, ""}, "Microsoft Windows XP  (Build 7601)"},
         {{3, 5, 1, 1, ""}, "Microsoft Windows Unknown Windows version  (Build 1)"},
     };
-    for (const auto& row : cases) {
-        Platform::OverrideVersionRecord(row.record);
-        EXPECT_EQ(GetOSDescription(), row.description);
-        EXPECT_EQ(GetOSVersion(), std::to_string(row.record.major) + "." + std::to_string(row.record.minor));
+    for (const auto& [record, description] : cases) {
+        Platform::OverrideVersionRecord(record);
+        EXPECT_EQ(GetOSDescription(), description);
+        EXPECT_EQ(GetOSVersion(), std::to_string(record.major) + "." + std::to_string(record.minor));
     }
 }
 

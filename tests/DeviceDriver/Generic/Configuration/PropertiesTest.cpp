@@ -114,20 +114,18 @@ TEST(Properties, DumpIsAStreamOfValuesWithOrWithoutIdentifiers) {
     Properties set;
     set.SetProperty(258, Property(std::int32_t{1}));
     set.SetProperty(3, Property(Floats{1.0F, -1.0F}));
-    const struct {
-        bool valuesOnly, bigEndian;
-        Bytes expected;
-    } cases[] = {{false, true, {1, 2, 0, 0, 0, 1, 0, 3, 0x3F, 0x80, 0, 0, 0xBF, 0x80, 0, 0}},
-                 {true, true, {0, 0, 0, 1, 0x3F, 0x80, 0, 0, 0xBF, 0x80, 0, 0}},
-                 {false, false, {2, 1, 1, 0, 0, 0, 3, 0, 0, 0, 0x80, 0x3F, 0, 0, 0x80, 0xBF}}};
-    for (const auto& row : cases) {
+    const std::vector<std::tuple<bool, bool, Bytes>> cases{
+        {false, true, {1, 2, 0, 0, 0, 1, 0, 3, 0x3F, 0x80, 0, 0, 0xBF, 0x80, 0, 0}},
+        {true, true, {0, 0, 0, 1, 0x3F, 0x80, 0, 0, 0xBF, 0x80, 0, 0}},
+        {false, false, {2, 1, 1, 0, 0, 0, 3, 0, 0, 0, 0x80, 0x3F, 0, 0, 0x80, 0xBF}}};
+    for (const auto& [valuesOnly, bigEndian, expected] : cases) {
         const auto dump = [&](std::size_t room) {
             Bytes bytes(room, 0xAA);
-            set.Dump(bytes.begin(), bytes.end(), row.valuesOnly, row.bigEndian);
+            set.Dump(bytes.begin(), bytes.end(), valuesOnly, bigEndian);
             return bytes;
         };
-        const std::size_t size = row.expected.size();
-        EXPECT_EQ(dump(size), row.expected);
+        const std::size_t size = expected.size();
+        EXPECT_EQ(dump(size), expected);
         EXPECT_EQ(dump(size + 1)[size], 0xAA);
         ExpectThrow<ResourceException>("Configuration data dump target too small", [&] { dump(size - 1); });
     }

@@ -30,24 +30,20 @@ TEST(PrecisionTime, CarriesAndBorrowsOnceAndCompares) {
 }
 
 TEST(PrecisionTime, ComesFromTheCounterOrWithoutOneFromTicks) {
-    const struct {
-        const char* name;
-        std::uint64_t frequency, counter;
-        std::uint32_t ticks;
-        PrecisionTime expected;
-    } cases[] = {
-        {"nanoseconds", 1000000000, 1234567891, 0, {1, 234567}},
-        {"truncated, not rounded", 3000000, 2, 0, {0, 0}},
-        {"last before it starts again", 1000000, 4294967295, 0, {4294, 967295}},
-        {"starts again", 1000000, 4294967296, 0, {0, 0}},
-        {"started again many times", 10000000, 3000000000000ULL, 0, {3647, 256576}},
-        {"milliseconds without a counter", 0, 99, 1999999, {1999, 999000}},
-        {"ticks are signed", 0, 0, 0xFFFFFC17, {-1, -1000}},
-    };
-    for (const auto& row : cases) {
+    const std::vector<std::tuple<const char*, std::uint64_t, std::uint64_t, std::uint32_t, PrecisionTime>>
+        cases{
+            {"nanoseconds", 1000000000, 1234567891, 0, {1, 234567}},
+            {"truncated, not rounded", 3000000, 2, 0, {0, 0}},
+            {"last before it starts again", 1000000, 4294967295, 0, {4294, 967295}},
+            {"starts again", 1000000, 4294967296, 0, {0, 0}},
+            {"started again many times", 10000000, 3000000000000ULL, 0, {3647, 256576}},
+            {"milliseconds without a counter", 0, 99, 1999999, {1999, 999000}},
+            {"ticks are signed", 0, 0, 0xFFFFFC17, {-1, -1000}},
+        };
+    for (const auto& [name, frequency, counter, ticks, expected] : cases) {
         PrecisionTime time;
-        time.SetFromReadings(row.frequency, row.counter, row.ticks);
-        EXPECT_EQ(time, row.expected) << row.name << ": " << time.GetSeconds() << " s";
+        time.SetFromReadings(frequency, counter, ticks);
+        EXPECT_EQ(time, expected) << name << ": " << time.GetSeconds() << " s";
     }
     // Ticks are whole milliseconds, the counter's readings are not.
     PrecisionTime now;

@@ -189,14 +189,12 @@ TEST_P(Commands, SendWhatEarlierCommandsLeftOverTheNativeDriverOnly) {
     PellandoFunctionality& instrument = Open();
     std::uint16_t value = 0;
     instrument.Reset(0x771F);
-    const struct {
-        Bytes answer;
-        std::uint16_t native, usbIo;
-    } answers[] = {{{}, 0x1F1F, 0}, {{31, 32}, 0x1F20, 0x1F20}, {{0x77}, 0x7720, 0x7700}};
-    for (const auto& row : answers) {
-        driver_.Script(0, {.data = row.answer});
+    const std::vector<std::tuple<Bytes, std::uint16_t, std::uint16_t>> answers{
+        {{}, 0x1F1F, 0}, {{31, 32}, 0x1F20, 0x1F20}, {{0x77}, 0x7720, 0x7700}};
+    for (const auto& [answer, native, usbIo] : answers) {
+        driver_.Script(0, {.data = answer});
         instrument.ReadCPLD(value);
-        EXPECT_EQ(value, isNative ? row.native : row.usbIo);
+        EXPECT_EQ(value, isNative ? native : usbIo);
     }
     driver_.Script(0, {.data = Counting(8, 0xA1)});
     instrument.GetMeasureParameters(a, b, c, m[0], m[1]);
@@ -214,39 +212,37 @@ TEST_P(Commands, EndWithTheTransferThatFails) {
     Bytes buffer(65);
     const auto write = [&](I& i) { i.WriteEEPROM(0, buffer); };
     const auto read = [&](I& i) { i.ReadEEPROM(0, buffer); };
-    const struct {
-        const char* name;
-        const char* usbIoName;  ///< of the operation that fails
-        std::uint32_t place;
-        std::size_t failing;  ///< of the transfers of this place; all behind one control
-        std::function<void(I&)> run;
-    } cases[] = {
-        {"out", "ClassOrVendorOutRequest", 0, 0, write},
-        {"in", "ClassOrVendorInRequest", 0, 0, [](I& i) { i.ReadCPLD(a); }},
-        {"measure", "ClassOrVendorOutRequest", 0, 0, [&](I& i) { i.MeasureRequest(buffer.data(), 64, 1); }},
-        {"scan", "ClassOrVendorOutRequest", 0, 0, [](I& i) { i.StartScan(5, 1, 0); }},
-        {"read, data", "ReadSync", In(), 0, read},
-        {"write, data", "WriteSync", Out(), 0, write},
-        {"write, first byte behind", "WriteSync", Out(), 1, write},
-        {"write, second byte behind", "WriteSync", Out(), 2, write},
-    };
+    // The name that USBIO gives the operation, and which transfer of the place fails; all are behind one
+    // control.
+    const std::vector<
+        std::tuple<const char*, const char*, std::uint32_t, std::size_t, std::function<void(I&)>>>
+        cases{
+            {"out", "ClassOrVendorOutRequest", 0, 0, write},
+            {"in", "ClassOrVendorInRequest", 0, 0, [](I& i) { i.ReadCPLD(a); }},
+            {"measure", "ClassOrVendorOutRequest", 0, 0,
+             [&](I& i) { i.MeasureRequest(buffer.data(), 64, 1); }},
+            {"scan", "ClassOrVendorOutRequest", 0, 0, [](I& i) { i.StartScan(5, 1, 0); }},
+            {"read, data", "ReadSync", In(), 0, read},
+            {"write, data", "WriteSync", Out(), 0, write},
+            {"write, first byte behind", "WriteSync", Out(), 1, write},
+            {"write, second byte behind", "WriteSync", Out(), 2, write},
+        };
     PellandoFunctionality& instrument = Open();
-    for (const auto& row : cases) {
-        SCOPED_TRACE(row.name);
-        for (std::size_t i = 0; i < row.failing; ++i) {
-            driver_.Script(row.place, {});
+    for (const auto& [name, usbIoName, place, failing, run] : cases) {
+        SCOPED_TRACE(name);
+        for (std::size_t i = 0; i < failing; ++i) {
+            driver_.Script(place, {});
         }
-        driver_.Script(row.place, {.code = stall, .after = 3});
-        const std::string nativeText = row.place == 0      ? "Device IO control failed: "
-                                       : row.place == In() ? "read data failed"
-                                                           : "write data failed";
+        driver_.Script(place, {.code = stall, .after = 3});
+        const std::string nativeText = place == 0      ? "Device IO control failed: "
+                                       : place == In() ? "read data failed"
+                                                       : "write data failed";
         ExpectThrow<IOException>(IsNative()
                                      ? nativeText + ErrorSuffix(stall)
-                                     : std::string("Error in UsbIo function: \"") + row.usbIoName +
+                                     : std::string("Error in UsbIo function: \"") + usbIoName +
                                            "\" Error: Error code 0xE0000030: USBD Error: Endpoint halted.",
-                                 [&] { row.run(instrument); });
-        EXPECT_EQ(TakeTransfers().size(), row.place == 0 ? 1 : row.failing + 2)
-            << "nothing follows a failure";
+                                 [&] { run(instrument); });
+        EXPECT_EQ(TakeTransfers().size(), place == 0 ? 1 : failing + 2) << "nothing follows a failure";
         EXPECT_EQ(buffer.size(), 65U);
     }
 }

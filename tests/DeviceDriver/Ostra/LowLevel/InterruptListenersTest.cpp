@@ -91,13 +91,7 @@ TYPED_TEST_SUITE(InterruptListeners, BothTransports);
 
 TYPED_TEST(InterruptListeners, TurnReadsIntoMessages) {
     enum On { Both, Native, UsbIo };
-    const struct {
-        const char* name;
-        On on;
-        std::vector<Answer> reads;
-        Codes messages;
-        bool touched;
-    } cases[] = {
+    const std::vector<std::tuple<const char*, On, std::vector<Answer>, Codes, bool>> cases{
         {"gone", Both, {Gone}, {MessageDeviceGone}, false},
         {"refused", Both, {{.refusal = Errors::AccessDenied}}, {MessageDeviceGone}, false},
         {"pressed twice", Both, {Press, Press, Gone}, {Button, Button, MessageDeviceGone}, true},
@@ -106,21 +100,21 @@ TYPED_TEST(InterruptListeners, TurnReadsIntoMessages) {
         {"pressed late", UsbIo, {Silence, Press, Gone}, {Button, MessageDeviceGone}, true},
         {"pressed as given up", UsbIo, {PressTooLate, Gone}, {Button, MessageDeviceGone}, true},
     };
-    for (const auto& row : cases) {
-        if (row.on != Both && row.on != (TypeParam::IsUsbIo ? UsbIo : Native)) {
+    for (const auto& [name, on, reads, expected, touched] : cases) {
+        if (on != Both && on != (TypeParam::IsUsbIo ? UsbIo : Native)) {
             continue;
         }
-        SCOPED_TRACE(row.name);
+        SCOPED_TRACE(name);
         RecordingListener messages;
-        this->Script(row.reads);
+        this->Script(reads);
         const auto watching = TypeParam::Make(this->pipe_);
         watching->SetListener(TypeParam::Receiver(messages));
         EXPECT_FALSE(watching->IsTouched());
         watching->Start();
-        WaitUntil([&] { return messages.Codes().size() >= row.messages.size(); });
+        WaitUntil([&] { return messages.Codes().size() >= expected.size(); });
         watching->Stop();  // the thread has ended by itself
-        EXPECT_EQ(messages.Codes(), row.messages);
-        EXPECT_EQ(watching->IsTouched(), row.touched);
+        EXPECT_EQ(messages.Codes(), expected);
+        EXPECT_EQ(watching->IsTouched(), touched);
         EXPECT_EQ(this->driver_.Running(this->Place), 0U);
     }
 }

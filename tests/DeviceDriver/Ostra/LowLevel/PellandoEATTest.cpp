@@ -96,11 +96,10 @@ TEST_F(FreshTable, SizeIsTheDistanceToTheNextEntry) {
 }
 
 TEST(PellandoEAT, HeaderDecidesWhetherAndHowFarTheTableIsRead) {
-    const struct {
-        std::uint16_t version, length;
-        std::ptrdiff_t entries;  ///< 0: refused
-    } cases[] = {{0, 334, 0},  {2, 334, 0},  {0x0100, 334, 0}, {1, 299, 0},  {1, 300, 50},
-                 {1, 304, 50}, {1, 305, 51}, {1, 508, 84},     {1, 512, 84}, {1, 513, 0}};
+    // Without entries the table is refused.
+    const std::vector<std::tuple<std::uint16_t, std::uint16_t, std::ptrdiff_t>> cases{
+        {0, 334, 0},  {2, 334, 0},  {0x0100, 334, 0}, {1, 299, 0},  {1, 300, 50},
+        {1, 304, 50}, {1, 305, 51}, {1, 508, 84},     {1, 512, 84}, {1, 513, 0}};
     Bytes bytes(EepromMap::TableArea, 0xFF);
     Entries many;
     for (std::uint16_t i = 0; i < 84; ++i) {
@@ -108,20 +107,20 @@ TEST(PellandoEAT, HeaderDecidesWhetherAndHowFarTheTableIsRead) {
         Protocol::StoreBig16(&bytes[4U + 6 * i], many.back().first);
         Protocol::StoreBig32(&bytes[6U + 6 * i], i);
     }
-    for (const auto& row : cases) {
-        SCOPED_TRACE(testing::Message() << "version " << row.version << ", length " << row.length);
-        Protocol::StoreBig16(&bytes[0], row.version);
-        Protocol::StoreBig16(&bytes[2], row.length);
+    for (const auto& [version, length, entries] : cases) {
+        SCOPED_TRACE(testing::Message() << "version " << version << ", length " << length);
+        Protocol::StoreBig16(&bytes[0], version);
+        Protocol::StoreBig16(&bytes[2], length);
         const auto table = TableOf({{101, 77}, {5, 88}});
-        if (row.entries == 0) {
+        if (entries == 0) {
             ExpectThrow<DataException>(Corrupt, [&] { table->ParseBuffer(bytes.data()); });
             ExpectThrow<DataException>(Corrupt, [&] { PellandoEAT{bytes.begin()}; });
             EXPECT_EQ(EntriesOf(*table), (Entries{{101, 77}, {5, 88}}));
         } else {
             // What the table holds keeps its place and gets the last address of its identifier.
-            Entries expected{{101, 1}, {5, 88}, {100, row.entries == 84 ? 83 : 0}};
+            Entries expected{{101, 1}, {5, 88}, {100, entries == 84 ? 83 : 0}};
             expected.insert(expected.end(), many.begin() + 2,
-                            many.begin() + std::min<std::ptrdiff_t>(row.entries, 83));
+                            many.begin() + std::min<std::ptrdiff_t>(entries, 83));
             table->ParseBuffer(bytes.data());
             EXPECT_EQ(EntriesOf(*table), expected);
         }
@@ -155,11 +154,8 @@ TEST_F(FreshTable, AChangeThatFailsChangesNothing) {
 
 TEST_F(FreshTable, IsFollowedWhereItCanBeUsedAndRefusedWhereNot) {
     constexpr std::size_t refused = ~std::size_t{0};
-    const struct {
-        const char* name;
-        std::int32_t address, next;  ///< of 3010 and of the entry behind it
-        std::size_t elements;        ///< read for 3010
-    } cases[] = {
+    // Addresses of 3010 and of the entry behind it, and what is read for 3010.
+    const std::vector<std::tuple<const char*, std::int32_t, std::int32_t, std::size_t>> cases{
         {"longer than usual", 4740, 4752, 3},
         {"empty at the end", 8192, 8192, 0},
         {"up to the last byte", 8188, 8192, 1},
@@ -172,15 +168,15 @@ TEST_F(FreshTable, IsFollowedWhereItCanBeUsedAndRefusedWhereNot) {
         {"farthest apart", Lowest, Highest, refused},
         {"size that wraps to a plausible one", Lowest, Lowest + 4, refused},
     };
-    for (const auto& row : cases) {
-        SCOPED_TRACE(row.name);
-        const auto table = TableOf({{3010, row.address}, {2, row.next}});
+    for (const auto& [name, address, next, elements] : cases) {
+        SCOPED_TRACE(name);
+        const auto table = TableOf({{3010, address}, {2, next}});
         const SectionReader read(*table, &ConfigurationDataConverter::IsCalibrationParameter);
-        if (row.elements == refused) {
+        if (elements == refused) {
             ExpectThrow<DataException>(Corrupt, [&] { read(image_.data(), 0); });
         } else {
             const Properties section = read(image_.data(), 0);
-            EXPECT_EQ(section.GetProperty(3010).AsLongVector().size(), row.elements);
+            EXPECT_EQ(section.GetProperty(3010).AsLongVector().size(), elements);
             EXPECT_EQ(section.GetProperty(3010).GetType(), TypeLong);
         }
     }

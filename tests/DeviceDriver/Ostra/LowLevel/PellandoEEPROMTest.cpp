@@ -23,6 +23,7 @@ using testing::IsEmpty;
 using Tests::ExpectThrow;
 using Varnholt::Utilities::Exceptions::ResourceException;
 using Longs = std::vector<std::int32_t>;
+using Changes = std::vector<std::pair<std::uint16_t, std::int32_t>>;
 
 const std::string LogWrites =
     "write 0+256 write 256+256 write 512+256 write 768+256 write 1024+40 "
@@ -38,7 +39,7 @@ class EepromTest : public testing::Test {
         eeprom_ = std::make_unique<PellandoEEPROM>(Open(instrument_));
         instrument_.TakeCommands();
     }
-    void Store(std::initializer_list<std::pair<std::uint16_t, std::int32_t>> values) {
+    void Store(const Changes& values) {
         set_ = Properties();
         for (const auto& [id, value] : values) {
             set_.SetProperty(id, Long(value));
@@ -87,18 +88,14 @@ TEST_F(EepromTest, IsReadInTwoHalvesAndThenServedFromMemory) {
 
 TEST_F(EepromTest, LoadFillsSetsByNameOrByIdentifier) {
     Load();
-    const struct {
-        const char* name;
-        std::size_t entries;
-        std::uint16_t first, last;
-    } cases[] = {
+    const std::vector<std::tuple<const char*, std::size_t, std::uint16_t, std::uint16_t>> cases{
         {"CalibrationData", 28, 1000, 3013}, {"LogData", 12, 10000, 10021}, {"EATData", 55, 10000, 2}};
-    for (const auto& row : cases) {
-        Properties named(row.name);
+    for (const auto& [name, entries, first, last] : cases) {
+        Properties named(name);
         EXPECT_EQ(&eeprom_->Load(named), &named);
-        ASSERT_EQ(named.GetItemCount(), row.entries) << row.name;
-        EXPECT_EQ(named.GetPropertyKeys().front(), row.first);
-        EXPECT_EQ(named.GetPropertyKeys().back(), row.last);
+        ASSERT_EQ(named.GetItemCount(), entries) << name;
+        EXPECT_EQ(named.GetPropertyKeys().front(), first);
+        EXPECT_EQ(named.GetPropertyKeys().back(), last);
     }
     Properties other("calibrationdata");
     EXPECT_EQ(eeprom_->Load(other).GetItemCount(), 0U);
@@ -114,25 +111,21 @@ TEST_F(EepromTest, LoadFillsSetsByNameOrByIdentifier) {
 }
 
 TEST_F(EepromTest, StoreObeysItsRequests) {
-    struct Case {
-        const char* name;
-        std::initializer_list<std::pair<std::uint16_t, std::int32_t>> values;
-        bool writesLog;
-        std::int32_t writeThroughAfterwards;  ///< 20001 in the caller's set; -1: not in it
-    };
+    // Afterwards 20001 is in the caller's set; -1: it is not.
     Load();
-    for (const Case& row : {
-             Case{"nothing of the EEPROM", {{2005, 1}}, false, -1},
-             Case{"a value", {{1211, 5}}, false, -1},
-             Case{"write through", {{1211, 5}, {20001, 1}}, true, 0},
-             Case{"not quite write through", {{20001, 2}}, false, 2},
-             Case{"dump", {{20002, 1}}, true, -1},
-             Case{"dump wins over write through", {{20001, 1}, {20002, 1}}, true, 1},
+    for (const auto& [name, values, writesLog, writeThroughAfterwards] :
+         std::vector<std::tuple<const char*, Changes, bool, std::int32_t>>{
+             {"nothing of the EEPROM", {{2005, 1}}, false, -1},
+             {"a value", {{1211, 5}}, false, -1},
+             {"write through", {{1211, 5}, {20001, 1}}, true, 0},
+             {"not quite write through", {{20001, 2}}, false, 2},
+             {"dump", {{20002, 1}}, true, -1},
+             {"dump wins over write through", {{20001, 1}, {20002, 1}}, true, 1},
          }) {
-        SCOPED_TRACE(row.name);
-        Store(row.values);
-        ExpectCommands(row.writesLog ? LogWrites : "");
-        EXPECT_EQ(set_.Contains(20001) ? set_.GetProperty(20001).AsLong() : -1, row.writeThroughAfterwards);
+        SCOPED_TRACE(name);
+        Store(values);
+        ExpectCommands(writesLog ? LogWrites : "");
+        EXPECT_EQ(set_.Contains(20001) ? set_.GetProperty(20001).AsLong() : -1, writeThroughAfterwards);
         ExpectLocked();
     }
     Store({{10002, 5}, {20002, 1}});

@@ -40,12 +40,7 @@ class LogTest : public testing::Test {
 };
 
 TEST_F(LogTest, ChecksumAddsIntegersAndBitPatternsModulo32Bits) {
-    const struct {
-        const char* name;
-        std::uint16_t id;
-        Property value;
-        std::uint32_t sum;
-    } cases[] = {
+    const std::vector<std::tuple<const char*, std::uint16_t, Property, std::uint32_t>> cases{
         {"a float's bit pattern", 10001, Property(-2.0F), 0xC0000000},
         {"every element of a vector", 10010, Property(Longs(128, 3)), 384},
         {"a sum that wraps", 10011, Property(Longs{-1, 4}), 3},
@@ -53,9 +48,9 @@ TEST_F(LogTest, ChecksumAddsIntegersAndBitPatternsModulo32Bits) {
     };
     std::uint32_t all = 0;
     PellandoLog together = Read();
-    for (const auto& row : cases) {
-        together.SetItem(row.id, row.value);
-        EXPECT_EQ(together.CalculateChecksum(), all += row.sum) << row.name;
+    for (const auto& [name, id, value, sum] : cases) {
+        together.SetItem(id, value);
+        EXPECT_EQ(together.CalculateChecksum(), all += sum) << name;
     }
     EXPECT_FALSE(together.HasValidChecksum());
     together.UpdateChecksum();
@@ -64,24 +59,22 @@ TEST_F(LogTest, ChecksumAddsIntegersAndBitPatternsModulo32Bits) {
 }
 
 TEST_F(LogTest, ValidCopyIsChosenMainCopyFirst) {
-    const struct {
-        const char* name;
-        std::uint32_t mainChecksum, secondChecksum;
-        std::int32_t expected;  ///< of 10002, which is 5 in the main copy and 6 in the second
-    } cases[] = {{"both right", 0x3F800005, 6, 5},
-                 {"main wrong", 0x3F800004, 6, 6},
-                 {"second wrong", 0x3F800005, 7, 5},
-                 {"both wrong", 0, 0, 0}};
+    // What 10002 is: 5 in the main copy and 6 in the second.
+    const std::vector<std::tuple<const char*, std::uint32_t, std::uint32_t, std::int32_t>> cases{
+        {"both right", 0x3F800005, 6, 5},
+        {"main wrong", 0x3F800004, 6, 6},
+        {"second wrong", 0x3F800005, 7, 5},
+        {"both wrong", 0, 0, 0}};
     Store(MainCopy + 4, 0x3F800000);
     Store(MainCopy + 8, 5);
     Store(SecondCopy + 8, 6);
-    for (const auto& row : cases) {
-        SCOPED_TRACE(row.name);
-        Store(MainCopy, row.mainChecksum);
-        Store(SecondCopy, row.secondChecksum);
+    for (const auto& [name, mainChecksum, secondChecksum, expected] : cases) {
+        SCOPED_TRACE(name);
+        Store(MainCopy, mainChecksum);
+        Store(SecondCopy, secondChecksum);
         const PellandoLog log = Read();
-        EXPECT_EQ(log.GetItem(10002).AsLong(), row.expected);
-        EXPECT_EQ(log.GetItem(10001).AsFloat(), row.expected == 5 ? 1.0F : 0.0F);
+        EXPECT_EQ(log.GetItem(10002).AsLong(), expected);
+        EXPECT_EQ(log.GetItem(10001).AsFloat(), expected == 5 ? 1.0F : 0.0F);
         EXPECT_TRUE(log.HasValidChecksum());
         EXPECT_EQ(log.GetItems().GetPropertyKeys(), PellandoEAT::GetDefaultLogData().GetPropertyKeys());
         EXPECT_EQ(log.SizeOf(), 1064U);

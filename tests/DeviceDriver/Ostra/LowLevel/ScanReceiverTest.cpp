@@ -58,32 +58,27 @@ OSTRA_ON_BOTH_TRANSPORTS(ReceivedScan);
 TEST_P(ReceivedScan, BringsWhatWouldBeCollectedAndWhatCameBeforeAFailure) {
     constexpr std::uint32_t total = Record * Records;
     const std::uint32_t first = IsNative() ? 10 * Record : 65536;  // bytes of a counted scan's transfers
-    struct Case {
-        const char* faults;
-        std::uint32_t total;
-        std::size_t received;
-        std::optional<std::uint32_t> usbIoCode;
-        std::optional<std::uint32_t> nativeCode;
-    };
     using namespace Protocol::UsbIoDriver;
-    for (const Case& row : {
-             Case{"", total, total, {}, {}},
-             Case{"", 0, total, {}, {}},
-             Case{"", 313 * Record, 313 * Record, {}, {}},  // more than a transfer
-             Case{"bulk-in 2:silent", total, 2 * first, Status::TimedOut, Platform::Errors::IoIncomplete},
-             Case{"bulk-in 2:late-cancel", total, std::size_t{3} * first, Status::TimedOut,
-                  Platform::Errors::IoIncomplete},
-             Case{"bulk-in 2:late-cancel", 0, IsNative() ? 22 * Record : std::size_t{3} * first,
-                  Status::TimedOut, Platform::Errors::IoIncomplete},
-             Case{"bulk-in 1:stall", total, first, Status::EndpointHalted, Platform::Errors::GeneralFailure},
-             Case{"bulk-in 1:short=512", total, first + 512, {}, {}},
-             Case{"bulk-in 1:short=300", 0, (IsNative() ? 2 * Record : first) + 300, {}, {}},
+    for (const auto& [faults, asked, received, usbIoCode, nativeCode] :
+         std::vector<std::tuple<const char*, std::uint32_t, std::size_t, std::optional<std::uint32_t>,
+                                std::optional<std::uint32_t>>>{
+             {"", total, total, {}, {}},
+             {"", 0, total, {}, {}},
+             {"", 313 * Record, 313 * Record, {}, {}},  // more than a transfer
+             {"bulk-in 2:silent", total, 2 * first, Status::TimedOut, Platform::Errors::IoIncomplete},
+             {"bulk-in 2:late-cancel", total, std::size_t{3} * first, Status::TimedOut,
+              Platform::Errors::IoIncomplete},
+             {"bulk-in 2:late-cancel", 0, IsNative() ? 22 * Record : std::size_t{3} * first, Status::TimedOut,
+              Platform::Errors::IoIncomplete},
+             {"bulk-in 1:stall", total, first, Status::EndpointHalted, Platform::Errors::GeneralFailure},
+             {"bulk-in 1:short=512", total, first + 512, {}, {}},
+             {"bulk-in 1:short=300", 0, (IsNative() ? 2 * Record : first) + 300, {}, {}},
          }) {
-        SCOPED_TRACE(std::string(row.faults) + " of " + std::to_string(row.total));
+        SCOPED_TRACE(std::string(faults) + " of " + std::to_string(asked));
         SimulatedHost host(GetParam());
         host.Add("a", Streaming());
-        if (*row.faults != '\0') {
-            host.Bus().SetFaults("a", Simulator::FaultPlan::Parse(row.faults));
+        if (*faults != '\0') {
+            host.Bus().SetFaults("a", Simulator::FaultPlan::Parse(faults));
         }
         CollectingReceiver receiver;
         std::optional<std::uint32_t> code;
@@ -92,7 +87,7 @@ TEST_P(ReceivedScan, BringsWhatWouldBeCollectedAndWhatCameBeforeAFailure) {
             instrument.SetScanReceiver(&receiver);
             const Stopwatch watch(clock_);
             try {
-                instrument.StartScan(Record, 1, row.total);
+                instrument.StartScan(Record, 1, asked);
             } catch (const IOException& exception) {
                 code = exception.Code();
             }
@@ -105,9 +100,9 @@ TEST_P(ReceivedScan, BringsWhatWouldBeCollectedAndWhatCameBeforeAFailure) {
             EXPECT_EQ(size, 0U) << "nothing is collected beside a receiver";
         }
         const Bytes all = Collected(total);
-        EXPECT_EQ(receiver.bytes.size(), row.received);
+        EXPECT_EQ(receiver.bytes.size(), received);
         EXPECT_TRUE(std::equal(receiver.bytes.begin(), receiver.bytes.end(), all.begin()));
-        EXPECT_EQ(code, IsNative() ? row.nativeCode : row.usbIoCode);
+        EXPECT_EQ(code, IsNative() ? nativeCode : usbIoCode);
     }
 }
 

@@ -67,13 +67,8 @@ TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
     const Bytes data = Counting(64, 1);
     const Answer slow{.data = data, .after = Never, .cancelledAfter = 40, .cancelledWithData = true};
     const std::string timedOut = "Device IO control failed ", few = " data failed (Not enough data)";
-    const struct {
-        const char* name;
-        std::uint32_t pipe;  ///< 0: a control
-        Answer answer;
-        std::uint64_t milliseconds;  ///< until the operation returns
-        std::string text;            ///< of the failure
-    } cases[] = {
+    // Pipe 0 is a control. The operation returns after so many milliseconds, with this text of its failure.
+    const std::vector<std::tuple<const char*, std::uint32_t, Answer, std::uint64_t, std::string>> cases{
         {"control, slow", 0, slow, 2041, timedOut + ErrorSuffix(Errors::IoPending)},
         {"control, not started", 0, {.refusal = 5}, 2001, timedOut + ErrorSuffix(5)},
         {"read, slow", 1, slow, 5104, "read data failed" + ErrorSuffix(Errors::IoIncomplete)},
@@ -86,15 +81,15 @@ TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
         {"read, longer", 1, {.data = data, .count = 65}, 0, "read" + few},
         {"write, short", 2, {.count = 63}, 0, "write" + few},
     };
-    for (const auto& row : cases) {
-        SCOPED_TRACE(row.name);
-        USBConnection connection(Path, row.pipe, NoHandle);
-        driver_.Script(row.pipe, row.answer);
+    for (const auto& [name, pipe, answer, milliseconds, text] : cases) {
+        SCOPED_TRACE(name);
+        USBConnection connection(Path, pipe, NoHandle);
+        driver_.Script(pipe, answer);
         const Stopwatch watch(clock_);
-        const auto operation = [&] { Transfer(connection, row.pipe); };
-        row.pipe == 0 ? ExpectThrow<TimeoutException>(row.text, operation)
-                      : ExpectThrow<IOException>(row.text, operation);
-        watch.Expect(row.milliseconds);
+        const auto operation = [&] { Transfer(connection, pipe); };
+        pipe == 0 ? ExpectThrow<TimeoutException>(text, operation)
+                  : ExpectThrow<IOException>(text, operation);
+        watch.Expect(milliseconds);
         EXPECT_EQ(driver_.Running(), 0u);
     }
 }

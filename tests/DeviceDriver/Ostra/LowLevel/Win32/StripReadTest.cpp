@@ -178,19 +178,17 @@ TEST_F(NativeStripRead, AppendsToTheListAndBeepsOnceWhenUncounted) {
 }
 
 TEST_F(NativeStripRead, LooksAtTheResultWhateverEndsTheWait) {
-    const struct {
-        std::uint32_t total;
-        const char* text;
-    } cases[] = {{0, "Read data failed (Abandoned)"},
-                 {120, "system busy. try again. Read data failed (Abandoned - remaining: 20 total: 120)"}};
-    for (const auto& row : cases) {
+    const std::vector<std::tuple<std::uint32_t, const char*>> cases{
+        {0, "Read data failed (Abandoned)"},
+        {120, "system busy. try again. Read data failed (Abandoned - remaining: 20 total: 120)"}};
+    for (const auto& [total, text] : cases) {
         const OwnedHandle abandoned(MakeMutex(""));
         BackgroundThread([&] { Wait(abandoned.Get(), Infinite); }).Join();
         ScanRecordList records;
         driver_.Script(ReadPipe, {.after = Never, .completesThrough = abandoned.Get()});
-        ExpectThrow<TimeoutException>(row.text, [&] {
-            row.total == 0 ? device_.ReadDataStrip(records, 5, Timeout)
-                           : device_.ReadDataCountedStrip(records, 5, Timeout, row.total);
+        ExpectThrow<TimeoutException>(text, [&] {
+            total == 0 ? device_.ReadDataStrip(records, 5, Timeout)
+                       : device_.ReadDataCountedStrip(records, 5, Timeout, total);
         });
         EXPECT_EQ(driver_.Running(ReadPipe), 0u);
         ReleaseMutex(abandoned.Get());

@@ -148,35 +148,32 @@ class UsbIoScan : public UsbIoTest {
 };
 
 TEST_F(UsbIoScan, FixedScansEndWithTheirSizeOrAShortTransfer) {
-    const struct {
-        const char* name;
-        std::uint32_t total;
-        std::vector<std::uint32_t> transfers;  ///< what the instrument sends
-        Lines reads;                           ///< what it is asked for
-        std::uint32_t end;
-    } cases[] = {
-        {"two transfers", 100000, {Whole, 34464, 0}, {"65536", "34464", "0", "0"}, 100000},
-        {"short", 100000, {Whole, 4464}, {"65536", "34464", "0"}, 70000},
-        {"short at once", 100000, {10}, {"65536", "34464"}, 10},
-        {"empty at once", 100000, {0}, {"65536", "34464"}, 0},
-        {"one byte", 1, {1, 0}, {"1", "0", "0"}, 1},
-        {"a whole transfer", Whole, {Whole, 0}, {"65536", "0", "0"}, Whole},
-        {"a byte more", Whole + 1, {Whole, 1, 0}, {"65536", "1", "0", "0"}, Whole + 1},
-    };
+    // The instrument sends these transfers and is asked for those reads.
+    const std::vector<
+        std::tuple<const char*, std::uint32_t, std::vector<std::uint32_t>, Lines, std::uint32_t>>
+        cases{
+            {"two transfers", 100000, {Whole, 34464, 0}, {"65536", "34464", "0", "0"}, 100000},
+            {"short", 100000, {Whole, 4464}, {"65536", "34464", "0"}, 70000},
+            {"short at once", 100000, {10}, {"65536", "34464"}, 10},
+            {"empty at once", 100000, {0}, {"65536", "34464"}, 0},
+            {"one byte", 1, {1, 0}, {"1", "0", "0"}, 1},
+            {"a whole transfer", Whole, {Whole, 0}, {"65536", "0", "0"}, Whole},
+            {"a byte more", Whole + 1, {Whole, 1, 0}, {"65536", "1", "0", "0"}, Whole + 1},
+        };
     for (const std::uint32_t after : {0U, 1U}) {
-        for (const auto& row : cases) {
-            SCOPED_TRACE(row.name);
+        for (const auto& [name, total, transfers, reads, end] : cases) {
+            SCOPED_TRACE(name);
             driver_.DropScript(BulkInEndpoint);
             TakeTranscript();
-            Send(row.transfers, after);
-            instrument_.StartScan(256, 1, row.total);
+            Send(transfers, after);
+            instrument_.StartScan(256, 1, total);
             Lines expected{"control 80942035 00 00 00 00 02 00 00 00 00 00 00 00 00 C0 00 00 00 00 /"};
-            for (const std::string& size : row.reads) {
+            for (const std::string& size : reads) {
                 expected.push_back("read 82 [" + size + "]");
             }
             expected.emplace_back("cancel 82");
             EXPECT_THAT(TakeTranscript(), ElementsAreArray(expected));
-            EXPECT_EQ(TakeAll(), Stream(row.end));
+            EXPECT_EQ(TakeAll(), Stream(end));
             EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
         }
     }
