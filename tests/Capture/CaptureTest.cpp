@@ -17,9 +17,7 @@
 namespace Varnholt::Tests {
 namespace {
 
-using Protocol::LoadLittle16;
-using Protocol::LoadLittle32;
-using Protocol::Request;
+using namespace Protocol;
 
 std::string TextOf(const Bytes& bytes, std::size_t start, std::size_t size) {
     return start + size <= bytes.size() ? Hex(&bytes[start], size) : "cut short";

@@ -120,38 +120,31 @@ TEST_P(InstrumentCommandsTest, ReadoutsSayWhatTheyWereTakenWith) {
 /// A failure and Ctrl-C alike; before the first readout there is nothing to keep. What was there is replaced
 /// by what is complete alone.
 TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
-    struct Case {
-        const char* repeat;
-        const char* faults;
-        std::uint64_t interruptedAt;  ///< microseconds, a second of them before the first readout
-        ExitCode code;
-        const char* text;
-        std::ptrdiff_t lines;
-    };
+    // Interrupted after so many microseconds, a second of them before the first readout.
     constexpr std::uint64_t never = 90'000'000;
-    for (const Case& row : {
-             Case{"2", "", never, ExitCode::Success, "2 readouts in 1.", 3},
-             Case{"5", "bulk-in 2:stall", never, ExitCode::InputOutput, "; 2 readouts were written", 3},
-             Case{"5", "", 2'500'000, ExitCode::Interrupted, "interrupted; 2 readouts were written", 3},
-             Case{"0", "", 1'500'000, ExitCode::Success, "1 readout in ", 2},
-             Case{"0", "", 500'000, ExitCode::Success, "interrupted; nothing was recorded", 0},
-             Case{"5", "bulk-in 0:stall", never, ExitCode::InputOutput, "; nothing was recorded", 0},
+    for (const auto& [repeat, faults, interruptedAt, code, text, lines] : std::vector<
+             std::tuple<const char*, const char*, std::uint64_t, ExitCode, const char*, std::ptrdiff_t>>{
+             {"2", "", never, ExitCode::Success, "2 readouts in 1.", 3},
+             {"5", "bulk-in 2:stall", never, ExitCode::InputOutput, "; 2 readouts were written", 3},
+             {"5", "", 2'500'000, ExitCode::Interrupted, "interrupted; 2 readouts were written", 3},
+             {"0", "", 1'500'000, ExitCode::Success, "1 readout in ", 2},
+             {"0", "", 500'000, ExitCode::Success, "interrupted; nothing was recorded", 0},
+             {"5", "bulk-in 0:stall", never, ExitCode::InputOutput, "; nothing was recorded", 0},
          }) {
-        SCOPED_TRACE(row.text);
+        SCOPED_TRACE(text);
         host_.Add("sim", Leisurely);
-        SetFaults(row.faults);
+        SetFaults(faults);
         WriteFile(folder_.Path("csv"), {1});
         Service::Interruption interruption;
         tool_.interruption = &interruption;
-        const auto event = After(row.interruptedAt, [&] { interruption.Request(); });
-        Fail(std::string("readout --csv --repeat ") + row.repeat + " --interval 1 --output @csv", row.code,
-             row.text);
+        const auto event = After(interruptedAt, [&] { interruption.Request(); });
+        Fail(std::string("readout --csv --repeat ") + repeat + " --interval 1 --output @csv", code, text);
         Platform::ClockScheduler().Forget(event);
-        const bool isReplaced = row.code == ExitCode::Success && row.lines > 0;
+        const bool isReplaced = code == ExitCode::Success && lines > 0;
         const std::string kept = folder_.Path(isReplaced ? "csv" : "csv.part");
-        const auto content = row.lines > 0 ? ReadFile(kept) : std::vector<std::uint8_t>();
-        EXPECT_EQ(std::count(content.begin(), content.end(), '\n'), row.lines);
-        EXPECT_EQ(std::filesystem::remove(kept), row.lines > 0);
+        const auto content = lines > 0 ? ReadFile(kept) : std::vector<std::uint8_t>();
+        EXPECT_EQ(std::count(content.begin(), content.end(), '\n'), lines);
+        EXPECT_EQ(std::filesystem::remove(kept), lines > 0);
         EXPECT_EQ(folder_.Files().size(), isReplaced ? 0u : 1u);
         EXPECT_TRUE(isReplaced || ReadFile(folder_.Path("csv")) == std::vector<std::uint8_t>{1});
     }

@@ -100,24 +100,17 @@ TEST(JsonTest, FloatsHaveTheDigitsThatTheyNeedAndTextsAreValid) {
 }
 
 TEST(ProgressTest, Lines) {
-    struct Case {
-        std::uint64_t done, total;
-        const char* unit;
-        double seconds;
-        std::size_t columns;
-        const char* line;
-    };
-    for (const Case& row : {
-             Case{0, 32, "pieces", 0, 79, "w  [                        ]  0 of 32 pieces"},
-             Case{16, 32, "pieces", 1, 79, "w  [============            ]  16 of 32 pieces"},
-             Case{1024, 0, "B", 2, 79, "w  1.0 kB  512 B/s"},
-             Case{40, 32, "pieces", 1, 79, "w  [========================]  40 of 32 pieces"},
-             Case{16, 32, "pieces", 1, 30, "w  [====    ]  16 of 32 pieces"},
-             Case{16, 32, "pieces", 1, 24, "w  16 of 32 pieces"},
-             Case{999'999'999, 1'000'000'000, "B", 10, 19, "w  1.0 GB of 1.0 GB"},
+    for (const auto& [done, total, unit, seconds, columns, line] :
+         std::vector<std::tuple<std::uint64_t, std::uint64_t, const char*, double, std::size_t, const char*>>{
+             {0, 32, "pieces", 0, 79, "w  [                        ]  0 of 32 pieces"},
+             {16, 32, "pieces", 1, 79, "w  [============            ]  16 of 32 pieces"},
+             {1024, 0, "B", 2, 79, "w  1.0 kB  512 B/s"},
+             {40, 32, "pieces", 1, 79, "w  [========================]  40 of 32 pieces"},
+             {16, 32, "pieces", 1, 30, "w  [====    ]  16 of 32 pieces"},
+             {16, 32, "pieces", 1, 24, "w  16 of 32 pieces"},
+             {999'999'999, 1'000'000'000, "B", 10, 19, "w  1.0 GB of 1.0 GB"},
          }) {
-        EXPECT_EQ(ProgressLine::LineFor("w", row.done, row.total, row.unit, row.seconds, row.columns),
-                  row.line);
+        EXPECT_EQ(ProgressLine::LineFor("w", done, total, unit, seconds, columns), line);
     }
 }
 

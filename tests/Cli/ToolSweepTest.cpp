@@ -14,9 +14,7 @@ namespace Varnholt::Tests {
 namespace {
 
 using Cli::ExitCode;
-using Simulator::Fault;
-using Simulator::FaultKind;
-using Simulator::FaultPlan;
+using namespace Simulator;
 using Bytes = std::vector<std::uint8_t>;
 using Files = std::map<std::string, Bytes>;
 
@@ -120,6 +118,9 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
         result.hits = script->Hits();
         EXPECT_EQ(instrument.PendingTransfers(), 0U);
         EXPECT_FALSE(instrument.Claimed());
+        host.Bus().SetFaults("sim", {});
+        instrument.PlugIn();
+        EXPECT_TRUE(result.code == ExitCode::Success || tool.Run("reset") == ExitCode::Success) << tool.Err();
         return result;
     }
 

@@ -16,6 +16,7 @@
 #include <fstream>
 #include <functional>
 #include <iterator>
+#include <optional>
 #include <span>
 #include <thread>
 #include <vector>
@@ -25,6 +26,7 @@
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
 #include "ostra.h"
 #include "Platform/HostQueries.h"
+#include "Platform/Linux/ForkedProcess.h"
 #include "Platform/Usb/UdevBus.h"
 #include "Support/Bytes.h"
 #include "Support/ResourceCount.h"
@@ -73,17 +75,14 @@ class PluggedInstrument final {
     explicit PluggedInstrument(std::vector<std::string> arguments) {
         EXPECT_TRUE(WaitFor(&AllPortsFree)) << "the port does not become free";
         arguments.insert(arguments.begin(), {"/root/ostra-simulator", "--attach"});
-        process_ = fork();
-        if (process_ == 0) {
+        process_.emplace([&arguments] {
             std::vector<char*> words;
-            for (std::string& argument : arguments) {
-                words.push_back(argument.data());
-            }
+            std::ranges::transform(arguments, std::back_inserter(words),
+                                   [](std::string& word) { return word.data(); });
             words.push_back(nullptr);
             (void)!freopen("/dev/null", "w", stdout);
-            execv(words[0], words.data());
-            _exit(127);
-        }
+            return execv(words[0], words.data());
+        });
         EXPECT_TRUE(WaitFor(&AnyPluggedIn)) << "the kernel does not show the instrument";
     }
     ~PluggedInstrument() {
@@ -93,16 +92,10 @@ class PluggedInstrument final {
     PluggedInstrument(const PluggedInstrument&) = delete;
     PluggedInstrument& operator=(const PluggedInstrument&) = delete;
 
-    void Unplug() {
-        if (process_ > 0) {
-            kill(process_, SIGKILL);
-            waitpid(process_, nullptr, 0);
-            process_ = -1;
-        }
-    }
+    void Unplug() { process_.reset(); }
 
   private:
-    pid_t process_ = -1;
+    std::optional<Platform::ForkedProcess> process_;
 };
 
 std::string LastError() {

@@ -108,19 +108,18 @@ TEST_P(Exports, NullPointersAreRefusedAndTextsFollowTheirRules) {
     EXPECT_EQ(LastError(), "unknown error");
     EXPECT_EQ(f3355d91d5df0e0b(image_.data(), nullptr), OSTRA_UNKNOWN_FAILURE);
     EXPECT_EQ(Readout(nullptr), OSTRA_UNKNOWN_FAILURE);
-    const std::function<void()> clearing[] = {
-        [] { EXPECT_THAT(b5ae189db26b2a1b("SDKVersion"), StrEq("1.0.3")); },
-        [] { EXPECT_THAT(b5ae189db26b2a1b("sdkversion"), StrEq("")); },
-        [] { EXPECT_THAT(b5ae189db26b2a1b(nullptr), StrEq("")); },
-        [] { EXPECT_THAT(c288a3930ffaa9d7(), StrEq("")); },
-    };
     EXPECT_EQ(Readout(), OSTRA_OK);
     EXPECT_EQ(LastError(), "") << "a call that succeeds clears it";
-    for (const auto& ask : clearing) {
+    for (const auto& [ask, answer] : std::vector<std::pair<const char* (*)(), const char*>>{
+             {[] { return b5ae189db26b2a1b("SDKVersion"); }, "1.0.3"},
+             {[] { return b5ae189db26b2a1b("sdkversion"); }, ""},
+             {[] { return b5ae189db26b2a1b(nullptr); }, ""},
+             {[] { return c288a3930ffaa9d7(); }, ""},
+         }) {
         EXPECT_EQ(d4fb86cecc88582a(nullptr, ""), OSTRA_UNKNOWN_FAILURE);
         EXPECT_EQ(LastError(), "unknown error");
         EXPECT_EQ(LastError(), "unknown error") << "asking for it does not clear it";
-        ask();
+        EXPECT_THAT(ask(), StrEq(answer));
         EXPECT_EQ(LastError(), "");
     }
 }
@@ -150,18 +149,9 @@ TEST_P(Exports, WhatIsThrownBelowThemBecomesACodeAndAText) {
 
 TEST(Readout, ConvertsBigEndianValuesAndRepeatsTheEdges) {
     std::array<std::uint8_t, Protocol::ReadoutBytes> bytes{};
-    const auto put = [&](std::size_t k, std::uint8_t high, std::uint8_t low) {
-        bytes[2 * k] = high;
-        bytes[2 * k + 1] = low;
-    };
-    put(0, 0x7F, 0xFF);  // never reaches the caller
-    put(1, 0x00, 0x10);
-    put(2, 0xF8, 0x00);
-    put(3, 0xF8, 0x01);
-    put(4, 0xFF, 0xFF);
-    put(126, 0x01, 0x00);
-    put(127, 0x55, 0x55);  // nor does this one
-
+    // The first and the last one never reach the caller.
+    std::ranges::copy(Bytes{0x7F, 0xFF, 0x00, 0x10, 0xF8, 0x00, 0xF8, 0x01, 0xFF, 0xFF}, bytes.begin());
+    std::ranges::copy(Bytes{0x01, 0x00, 0x55, 0x55}, bytes.end() - 4);
     const auto values = Interface::ReadoutFromBytes(bytes);
     EXPECT_EQ(std::vector(values.begin(), values.begin() + 5), (std::vector{16, 16, 63488, -2047, -1}));
     EXPECT_EQ(std::vector(values.begin() + 125, values.end()), (std::vector{0, 256, 256}));

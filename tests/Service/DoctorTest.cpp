@@ -6,9 +6,7 @@
 namespace Varnholt::Tests {
 namespace {
 
-using Service::Failure;
-using Service::FailureKind;
-using Service::MachineFacts;
+using namespace Service;
 using testing::HasSubstr;
 
 Service::DeviceFacts Plugged(const char* kernelDriver = "", bool isRegistered = true) {

@@ -44,7 +44,6 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
               0x022F},
              {"too new", true, usbIo, "np", "of interface version 3.00", "install a USBIO driver", NotFound,
               0x0300},
-             {"the newest", true, usbIo, "ng", "answers", "", {}, 0x02FF},
              {"no setupapi", true, none, "p", "setupapi.dll, which finds instruments, cannot be",
               "sfc /scannow", NotFound, 0, Errors::ModuleNotFound},
              {"another setupapi", false, none, "p", "lacks functions", "beside the program", NotFound, 0,

@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <numeric>
 #include <string>
 #include <tuple>
 #include <vector>
@@ -26,12 +28,9 @@ namespace Map = Protocol::EepromMap;
 EepromImage UsedImage() {
     EepromImage image = FreshImage();
     image = WithCalibration(image, {{1211, "77"}, {1000, "0.5,-2"}}).image;
-    for (std::uint32_t i = 0; i < Map::BinaryFirstSize; ++i) {
-        image[Map::BinaryFirst + i] = static_cast<std::uint8_t>(i * 3);
-    }
-    for (std::uint32_t i = 0; i < Map::BinarySecondSize; ++i) {
-        image[Map::BinarySecond + i] = static_cast<std::uint8_t>(i * 5 + 1);
-    }
+    std::vector<std::uint8_t> block(Map::BinarySize);
+    std::ranges::generate(block, [byte = std::uint8_t{0}]() mutable { return byte += 3; });
+    image = WithBinaryBlock(image, block);
     SetRawWord(image, 10203, 0x01020304);
     image[8000] = 0x42;
     return image;
@@ -39,12 +38,9 @@ EepromImage UsedImage() {
 
 /// Addresses at which two images differ.
 std::vector<std::uint32_t> Differences(const EepromImage& a, const EepromImage& b) {
-    std::vector<std::uint32_t> addresses;
-    for (std::uint32_t at = 0; at < a.size(); ++at) {
-        if (a[at] != b[at]) {
-            addresses.push_back(at);
-        }
-    }
+    std::vector<std::uint32_t> addresses(a.size());
+    std::iota(addresses.begin(), addresses.end(), 0U);
+    std::erase_if(addresses, [&](std::uint32_t at) { return a[at] == b[at]; });
     return addresses;
 }
 
@@ -64,14 +60,13 @@ TEST(ImageTransportTest, ReachesNothingOutsideTheImage) {
     EepromImage image(8192, 7);
     ImageTransport transport(image);
     std::vector<std::uint8_t> buffer(9000);
-    for (const auto& [start, count, isInside] :
-         std::vector<std::tuple<std::uint32_t, std::uint32_t, bool>>{{0, 8192, true},
-                                                                     {8191, 1, true},
-                                                                     {8192, 0, true},
-                                                                     {8191, 2, false},
-                                                                     {8193, 0, false},
-                                                                     {0xFFFFFFFF, 2, false},
-                                                                     {0, 8193, false}}) {
+    for (const auto& [start, count, isInside] : {std::tuple(0U, 8192U, true),
+                                                 {8191U, 1U, true},
+                                                 {8192U, 0U, true},
+                                                 {8191U, 2U, false},
+                                                 {8193U, 0U, false},
+                                                 {0xFFFFFFFFU, 2U, false},
+                                                 {0U, 8193U, false}}) {
         DeviceDriver::Ostra::LowLevel::Bytes4 address;
         Protocol::StoreBig32(address.data(), start);
         const auto reaches = [&, count = count](auto function) {
@@ -157,9 +152,7 @@ TEST(ImageEditTest, RefusesWhatItCannotProve) {
 TEST(ImageEditTest, BinaryBlockLiesInTwoPlaces) {
     const EepromImage before = UsedImage();
     std::vector<std::uint8_t> block(Map::BinarySize);
-    for (std::size_t i = 0; i < block.size(); ++i) {
-        block[i] = static_cast<std::uint8_t>(i % 251);
-    }
+    std::ranges::generate(block, [byte = std::uint8_t{0}]() mutable { return byte += 7; });
     const EepromImage after = WithBinaryBlock(before, block);
     EXPECT_EQ(BinaryBlockOf(after), block);
     EXPECT_EQ(ImageModel(after).Get().LoadBinary(10100), block) << "as the driver sees it";

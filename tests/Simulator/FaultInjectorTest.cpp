@@ -13,14 +13,9 @@
 namespace Varnholt::Simulator {
 namespace {
 
-using Platform::Usb::TransferStatus;
-using Platform::Usb::UsbDevice;
-using Protocol::BulkInEndpoint;
-using Protocol::BulkOutEndpoint;
-using Protocol::Request;
-using Tests::Bytes;
-using Tests::Counting;
-using Tests::TestTransfer;
+using namespace Platform::Usb;
+using namespace Protocol;
+using namespace Tests;
 namespace Errors = Platform::Errors;
 
 constexpr std::uint32_t ReadLength = 64;

@@ -11,15 +11,9 @@
 namespace Varnholt::Simulator {
 namespace {
 
-using Platform::Usb::SetupPacket;
-using Platform::Usb::TransferStatus;
-using Protocol::BulkInEndpoint;
-using Protocol::BulkOutEndpoint;
-using Protocol::InterruptInEndpoint;
-using Protocol::Request;
-using Tests::Bytes;
-using Tests::Counting;
-using Tests::TestTransfer;
+using namespace Platform::Usb;
+using namespace Protocol;
+using namespace Tests;
 namespace Errors = Platform::Errors;
 
 class SimulatedInstrumentTest : public testing::Test {

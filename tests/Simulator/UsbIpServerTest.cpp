@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "Platform/Linux/ForkedProcess.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/SimulatorBus.h"
 #include "Platform/Usb/SystemUsbBus.h"
@@ -24,16 +25,9 @@
 namespace Varnholt::Simulator {
 namespace {
 
-using Platform::Usb::ListSimulators;
-using Platform::Usb::SimulatorBus;
-using Platform::Usb::SimulatorInfo;
-using Platform::Usb::TransferStatus;
-using Platform::Usb::UsbDevice;
-using Protocol::BulkInEndpoint;
-using Protocol::BulkOutEndpoint;
-using Protocol::Request;
-using Tests::Bytes;
-using Tests::TestTransfer;
+using namespace Platform::Usb;
+using namespace Protocol;
+using namespace Tests;
 namespace Errors = Platform::Errors;
 namespace UsbIp = Platform::Usb::UsbIp;
 
@@ -68,13 +62,10 @@ class UsbIpServerTest : public testing::Test {
         return isListed;
     }
     static SimulatorInfo Describe(const std::string& name) {
-        for (const SimulatorInfo& info : ListSimulators()) {
-            if (info.name == "simulated-" + name) {
-                return info;
-            }
-        }
-        ADD_FAILURE() << name << " is not there";
-        return {};
+        auto infos = ListSimulators();
+        std::erase_if(infos, [&](const SimulatorInfo& info) { return info.name != "simulated-" + name; });
+        EXPECT_EQ(1U, infos.size()) << name;
+        return infos.empty() ? SimulatorInfo() : infos.front();
     }
 
     const std::string name_ = ServerThread::UniqueName("a");
@@ -239,28 +230,20 @@ TEST_F(UsbIpServerTest, AnotherUsersSimulatorIsSeenAndNotUsed) {
         GTEST_SKIP() << "needs root to become somebody else";
     }
     constexpr uid_t nobody = 65534;
-    int ready[2] = {-1, -1};
-    ASSERT_EQ(0, pipe(ready));
-    const pid_t child = fork();
-    if (child == 0) {
-        if (setuid(nobody) == 0 && Platform::Usb::ListenAsSimulator(name_) >= 0 &&
-            write(ready[1], "y", 1) == 1) {
-            pause();
-        }
-        _exit(1);
+    const Platform::ForkedProcess other(
+        [this] { return setuid(nobody) == 0 && Platform::Usb::ListenAsSimulator(name_) >= 0 ? pause() : 1; });
+    const auto isThere = [this] {
+        return std::ranges::count(ListSimulators(), "simulated-" + name_, &SimulatorInfo::name) == 1;
+    };
+    for (int look = 0; look < 10'000 && !isThere(); ++look) {
+        usleep(1000);
     }
-    close(ready[1]);
-    char answer = 'n';
-    ASSERT_EQ(1, read(ready[0], &answer, 1));
     EXPECT_FALSE(Listed(name_));
     const SimulatorInfo info = Describe(name_);
     EXPECT_FALSE(info.usable);
     EXPECT_EQ(nobody, info.userId);
-    EXPECT_EQ(child, info.processId);
+    EXPECT_EQ(other.Id(), info.processId);
     Open(name_, Errors::AccessDenied);
-    kill(child, SIGKILL);
-    waitpid(child, nullptr, 0);
-    close(ready[0]);
 }
 
 }  // namespace

@@ -17,8 +17,7 @@ namespace {
 
 namespace UsbIp = Platform::Usb::UsbIp;
 using Platform::Usb::SetupPacket;
-using Protocol::BulkInEndpoint;
-using Protocol::Request;
+using namespace Protocol;
 using Tests::Bytes;
 
 Bytes Packet(const UsbIp::Packet& packet, const Bytes& data = {}) {

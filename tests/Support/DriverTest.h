@@ -29,6 +29,9 @@ using DeviceDriver::Generic::Utilities::IOException;
 using DeviceDriver::Generic::Utilities::TimeoutException;
 using BackgroundThread = Platform::TestThread;
 using Lines = std::vector<std::string>;
+using testing::ElementsAre;
+using testing::ElementsAreArray;
+using testing::IsEmpty;
 
 /// The scripted driver as the device files in force.
 class DriverTest : public testing::Test {

@@ -30,12 +30,19 @@
 namespace Varnholt::Tests {
 namespace {
 
+using Platform::Usb::UsbDevice;
 using TestSupport::ResourceCount;
 
 /// A device whose own allocations do not fail.
-class ExemptDevice final : public Platform::Usb::UsbDevice {
+class ExemptDevice final : public UsbDevice {
+    template <class Function, class... Argument>
+    auto Call(Function function, Argument&... argument) {
+        const Exempt guard;
+        return (*device_.*function)(argument...);
+    }
+
   public:
-    explicit ExemptDevice(std::shared_ptr<Platform::Usb::UsbDevice> behind) : device_(std::move(behind)) {}
+    explicit ExemptDevice(std::shared_ptr<UsbDevice> behind) : device_(std::move(behind)) {}
     ~ExemptDevice() override {
         const Exempt guard;
         device_.reset();
@@ -43,29 +50,18 @@ class ExemptDevice final : public Platform::Usb::UsbDevice {
     std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
         return device_->Endpoints(error);
     }
-    Platform::ErrorCode Claim() override {
-        const Exempt guard;
-        return device_->Claim();
-    }
-    void Release() override {
-        const Exempt guard;
-        device_->Release();
-    }
+    Platform::ErrorCode Claim() override { return Call(&UsbDevice::Claim); }
+    void Release() override { Call(&UsbDevice::Release); }
     Platform::ErrorCode Submit(Platform::Usb::Transfer& transfer) override {
-        const Exempt guard;
-        return device_->Submit(transfer);
+        return Call(&UsbDevice::Submit, transfer);
     }
-    void Cancel(Platform::Usb::Transfer& transfer) override {
-        const Exempt guard;
-        device_->Cancel(transfer);
-    }
+    void Cancel(Platform::Usb::Transfer& transfer) override { Call(&UsbDevice::Cancel, transfer); }
     Platform::ErrorCode ClearHalt(std::uint8_t endpoint) override {
-        const Exempt guard;
-        return device_->ClearHalt(endpoint);
+        return Call(&UsbDevice::ClearHalt, endpoint);
     }
 
   private:
-    std::shared_ptr<Platform::Usb::UsbDevice> device_;
+    std::shared_ptr<UsbDevice> device_;
 };
 
 /// The virtual clock makes a thread when an event comes while a lock is held; that one is not to be counted.
@@ -76,31 +72,23 @@ void StartTheClocksOwnThread() {
     Platform::SleepMilliseconds(1);
 }
 
-using Call = std::int32_t (*)();
-
-std::int32_t Readout() {
-    static std::array<std::int32_t, OSTRA_READOUT_VALUES> values;
-    return d4fb86cecc88582a(values.data(), "");
-}
-
-std::int32_t ImageWrite() {
-    static const std::array<std::uint8_t, OSTRA_IMAGE_SIZE> image{};
-    return f3355d91d5df0e0b(image.data(), "");
-}
-
-std::int32_t NamedReadout() {
-    static std::array<std::int32_t, OSTRA_READOUT_VALUES> values;
-    return d4fb86cecc88582a(values.data(), "an instrument that is not connected, with a name of some length");
-}
+std::array<std::int32_t, OSTRA_READOUT_VALUES> values;
+constexpr std::array<std::uint8_t, OSTRA_IMAGE_SIZE> Image{};
 
 /// An exported function.
 struct Case {
     const char* name;
-    Call call;
+    std::int32_t (*call)();
     bool succeeds;  ///< when no allocation fails
 };
-constexpr std::array Cases{Case{"Readout", &Readout, true}, Case{"ImageWrite", &ImageWrite, true},
-                           Case{"NamedReadout", &NamedReadout, false}};
+constexpr std::array Cases{
+    Case{"Readout", [] { return d4fb86cecc88582a(values.data(), ""); }, true},
+    Case{"ImageWrite", [] { return f3355d91d5df0e0b(Image.data(), ""); }, true},
+    Case{"NamedReadout",
+         [] {
+             return d4fb86cecc88582a(values.data(), "an instrument that is not connected, with a long name");
+         },
+         false}};
 
 class AllocationFailure : public testing::TestWithParam<std::tuple<Transport, std::size_t>> {};
 
@@ -201,13 +189,12 @@ std::uint32_t RunStream() {
 }
 
 TEST(UsbIoAllocation, EveryFailureIsAStatus) {
-    const std::pair<const char*, std::uint32_t (*)()> operations[] = {{"Open", &Open},
-                                                                      {"UsePool", &UsePool},
-                                                                      {"Reader", &RunStream<CUsbIoReader>},
-                                                                      {"Writer", &RunStream<CUsbIoWriter>}};
     const Simulator::VirtualClock clock(1);
     StartTheClocksOwnThread();
-    for (const auto& [name, run] : operations) {
+    for (const auto& [name, run] : {std::pair("Open", &Open),
+                                    {"UsePool", &UsePool},
+                                    {"Reader", &RunStream<CUsbIoReader>},
+                                    {"Writer", &RunStream<CUsbIoWriter>}}) {
         bool reached = true;
         for (int failures = 0; reached && failures < 1000; ++failures) {
             SCOPED_TRACE(name + std::string(", allocation ") + std::to_string(failures + 1));
@@ -218,10 +205,10 @@ TEST(UsbIoAllocation, EveryFailureIsAStatus) {
             FailAllocation(failures + 1);
             const std::uint32_t status = run();
             reached = StopFailing();
-            EXPECT_TRUE(status == Status::Success || (reached && status == Status::NoMemory) ||
-                        (reached && status == Platform::Errors::NotEnoughMemory) ||
-                        (reached && status == Platform::Errors::NoSystemResources))
-                << std::hex << status;
+            EXPECT_THAT(status,
+                        testing::AnyOf(Status::Success, Status::NoMemory, Platform::Errors::NotEnoughMemory,
+                                       Platform::Errors::NoSystemResources));
+            EXPECT_TRUE(reached || status == Status::Success);
             EXPECT_EQ(run(), Status::Success) << "nothing is left of the failure";
             EXPECT_EQ(host.Bus().Instrument("one").PendingTransfers(), 0U);
         }

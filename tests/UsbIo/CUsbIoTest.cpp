@@ -17,9 +17,7 @@ using namespace Protocol;
 using namespace Protocol::UsbIoDriver;
 using testing::ElementsAre;
 using testing::IsEmpty;
-using Tests::Answer;
-using Tests::Bytes;
-using Tests::Never;
+using namespace Tests;
 
 TEST(CUsbIoErrorText, EveryStatusHasTheTextOfTheDocumentedTable) {
     const std::string unknown = StatusText(5);
@@ -94,17 +92,16 @@ TEST_F(CUsbIoTest, OpensByListAndByNumber) {
 }
 
 TEST_F(CUsbIoTest, AcceptsInterfaceVersions2From30On) {
-    for (const auto& [version, isAccepted] : std::map<std::uint16_t, bool>{{0x0230, true},
-                                                                           {0x02FF, true},
-                                                                           {0x022F, false},
-                                                                           {0x0300, false},
-                                                                           {0x0130, false},
-                                                                           {0x3002, false}}) {
-        driver_.Script(Control::GetDriverInfo, {.data = {static_cast<std::uint8_t>(version),
-                                                         static_cast<std::uint8_t>(version >> 8)}});
+    for (const auto& [major, minor, isAccepted] :
+         std::vector<std::tuple<std::uint8_t, std::uint8_t, bool>>{{2, 0x30, true},
+                                                                   {2, 0xFF, true},
+                                                                   {2, 0x2F, false},
+                                                                   {3, 0, false},
+                                                                   {1, 0x30, false},
+                                                                   {0x30, 2, false}}) {
+        driver_.Script(Control::GetDriverInfo, {.data = {minor, major}});
         CUsbIo device;
-        EXPECT_EQ(Open(device), isAccepted ? Status::Success : Status::VersionMismatch)
-            << std::hex << version;
+        EXPECT_EQ(Open(device), isAccepted ? Status::Success : Status::VersionMismatch) << int{major};
         EXPECT_EQ(driver_.OpenFiles(), isAccepted ? 1U : 0U);
     }
 }
@@ -179,10 +176,7 @@ TEST_F(CUsbIoTest, SendsTheDriversRecords) {
     EXPECT_EQ(device.ClassOrVendorInRequest(data.data(), length, request), Status::DeviceRemoved);
     EXPECT_THAT(data, ElementsAre(9, 8, 3));
 
-    std::string unused;
-    for (int i = 0; i < 30 * 8; ++i) {
-        unused += " 00";
-    }
+    const std::string unused = " " + Tests::Hex(Bytes(240).data(), 240);
     const std::string block = " 04 03 02 01 02 00 00 00 0D 0C 0B 0A 55 C0 34 12 78 56";
     EXPECT_THAT(driver_.TakeTranscript(),
                 ElementsAre("control 80942028 /",

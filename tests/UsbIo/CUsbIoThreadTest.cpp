@@ -11,12 +11,9 @@ namespace Varnholt::UsbIo {
 namespace {
 
 using namespace Protocol::UsbIoDriver;
-using Protocol::BulkInEndpoint;
-using Protocol::BulkOutEndpoint;
+using namespace Protocol;
 using testing::ElementsAreArray;
-using Tests::Lines;
-using Tests::Never;
-using Tests::WaitUntil;
+using namespace Tests;
 
 constexpr std::uint32_t Limit = 10000;
 

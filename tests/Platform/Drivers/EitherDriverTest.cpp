@@ -7,11 +7,8 @@ namespace {
 namespace Errors = Platform::Errors;
 namespace Native = Protocol::NativeDriver;
 namespace UsbIo = Protocol::UsbIoDriver;
-using Platform::ErrorCode;
-using Platform::Handle;
-using Protocol::BulkInEndpoint;
-using Protocol::BulkOutEndpoint;
-using Protocol::InterruptInEndpoint;
+using namespace Platform;
+using namespace Protocol;
 
 enum class Kind { Native, UsbIo };
 
@@ -46,30 +43,25 @@ INSTANTIATE_TEST_SUITE_P(, EitherDriver, testing::Values(Kind::Native, Kind::Usb
 
 TEST_P(EitherDriver, CarriesVendorRequests) {
     const auto file = OpenMain();
-    struct Case {
-        std::uint8_t request;
-        bool in;
-        std::uint16_t value, index;
-        std::uint32_t length, moved;
-    };
-    for (const Case& row : {
-             Case{0xC0, false, 0, 0, 0, 0},
-             Case{0xC1, false, 0x1234, 0xABCD, 8, 8},
-             Case{0xA0, false, 0x2000, 0, 65535, 65535},
-             Case{0xC2, true, 0, 0, 8, 8},
-             Case{0xD1, true, 0, 0x0102, 6, 2},
+    for (const auto& [request, in, value, index, length, moved] : std::vector<
+             std::tuple<std::uint8_t, bool, std::uint16_t, std::uint16_t, std::uint32_t, std::uint32_t>>{
+             {0xC0, false, 0, 0, 0, 0},
+             {0xC1, false, 0x1234, 0xABCD, 8, 8},
+             {0xA0, false, 0x2000, 0, 65535, 65535},
+             {0xC2, true, 0, 0, 8, 8},
+             {0xD1, true, 0, 0x0102, 6, 2},
          }) {
-        SCOPED_TRACE(int{row.request});
-        device_->AnswerAtOnce(TransferStatus::Completed, row.moved);
-        const Bytes before = Counting(row.length, 7);
+        SCOPED_TRACE(int{request});
+        device_->AnswerAtOnce(TransferStatus::Completed, moved);
+        const Bytes before = Counting(length, 7);
         Bytes data = before, after = before;
-        EXPECT_EQ(Vendor(file, row.request, row.in, data, row.value, row.index), (Outcome{0, row.moved}));
-        const std::uint8_t type = row.in ? 0xC0 : 0x40;
-        EXPECT_EQ(device_->last.setup, (Platform::Usb::SetupPacket{type, row.request, row.value, row.index,
-                                                                   static_cast<std::uint16_t>(row.length)}));
+        EXPECT_EQ(Vendor(file, request, in, data, value, index), (Outcome{0, moved}));
+        const std::uint8_t type = in ? 0xC0 : 0x40;
+        EXPECT_EQ(device_->last.setup, (Platform::Usb::SetupPacket{type, request, value, index,
+                                                                   static_cast<std::uint16_t>(length)}));
         EXPECT_EQ(device_->last.endpoint, 0);
-        EXPECT_EQ(device_->sent, row.in ? Bytes() : before);
-        std::iota(after.data(), after.data() + (row.in ? row.moved : 0), std::uint8_t{0});
+        EXPECT_EQ(device_->sent, in ? Bytes() : before);
+        std::iota(after.data(), after.data() + (in ? moved : 0), std::uint8_t{0});
         EXPECT_EQ(data, after);
     }
 }

@@ -12,8 +12,7 @@ namespace {
 
 namespace Errors = Platform::Errors;
 namespace Native = Protocol::NativeDriver;
-using Platform::ErrorOf;
-using Platform::WaitResult;
+using namespace Platform;
 
 constexpr std::uint8_t In = Protocol::BulkInEndpoint;
 constexpr std::uint8_t Interrupt = Protocol::InterruptInEndpoint;

@@ -27,6 +27,7 @@ class ForkedProcess final {
             WaitForExit();
         }
     }
+    pid_t Id() const { return process_; }
     /// Its exit code; -1 when it did not come to its end.
     int WaitForExit() {
         int status = -1;

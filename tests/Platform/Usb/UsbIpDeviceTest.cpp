@@ -22,8 +22,7 @@ namespace Varnholt::Platform::Usb {
 namespace {
 
 using Clock = std::chrono::steady_clock;
-using Protocol::BulkInEndpoint;
-using Protocol::BulkOutEndpoint;
+using namespace Protocol;
 using namespace Tests;
 
 Bytes ImportReply(UsbIp::OperationStatus status = UsbIp::OperationStatus::Ok) {

@@ -18,12 +18,9 @@
 namespace Varnholt::Utilities::Multithreading {
 namespace {
 
-using Exceptions::InvalidArgumentException;
-using Exceptions::ResourceException;
+using namespace Exceptions;
 using Platform::SleepMilliseconds;
-using Tests::BackgroundThread;
-using Tests::ExpectThrow;
-using Tests::WaitUntil;
+using namespace Tests;
 
 void Elsewhere(std::function<void()> work) {
     BackgroundThread(std::move(work)).Join();

@@ -12,8 +12,7 @@ namespace {
 
 using testing::ElementsAre;
 using Tests::ExpectThrow;
-using Varnholt::Utilities::Exceptions::ResourceException;
-using Varnholt::Utilities::Exceptions::RuntimeException;
+using namespace Varnholt::Utilities::Exceptions;
 using Bytes = std::vector<std::uint8_t>;
 using Longs = std::vector<std::int32_t>;
 using Floats = std::vector<float>;

@@ -18,14 +18,9 @@ namespace {
 
 using namespace Platform;
 using DeviceDriver::Generic::MessageButtonData;
-using DeviceDriver::Ostra::LowLevel::PellandoFunctionality;
-using DeviceDriver::Ostra::LowLevel::PellandoFunctionality_PC;
-using DeviceDriver::Ostra::LowLevel::PellandoFunctionalityByte;
+using namespace DeviceDriver::Ostra::LowLevel;
 using Protocol::UsbIoDriver::Status::EndpointHalted;
-using testing::ElementsAre;
-using testing::IsEmpty;
-using Utilities::Exceptions::InvalidArgumentException;
-using Utilities::Exceptions::NullPointerException;
+using namespace Utilities::Exceptions;
 using I = PellandoFunctionality;
 using Pointer = Utilities::Tools::SmartPointer<PellandoFunctionalityByte>;
 

@@ -11,15 +11,10 @@ namespace Varnholt::Tests {
 namespace {
 
 using namespace Platform;
-using DeviceDriver::Generic::EventListener;
-using DeviceDriver::Generic::MessageButtonData;
-using DeviceDriver::Generic::MessageDeviceGone;
-using DeviceDriver::Ostra::LowLevel::InterruptListener;
-using DeviceDriver::Ostra::LowLevel::InterruptListener_Win64;
-using testing::ElementsAre;
-using testing::IsEmpty;
+using namespace DeviceDriver::Generic;
+using namespace DeviceDriver::Ostra::LowLevel;
 using Codes = std::vector<std::uint32_t>;
-using UsbIoPipe = Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe>;
+using UsbIoPipe = Varnholt::Utilities::Tools::SmartPointer<UsbIo::CUsbIoPipe>;
 
 constexpr std::uint32_t Button = MessageButtonData;
 const Answer Press{.data = {1}, .after = 5};

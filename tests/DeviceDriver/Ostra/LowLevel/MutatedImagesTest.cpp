@@ -17,12 +17,6 @@ namespace {
 namespace EepromMap = Protocol::EepromMap;
 using Bytes = std::vector<std::uint8_t>;
 
-/// `OSTRA_LONG=1` in the environment asks for ten times as many.
-std::uint32_t ImageCount() {
-    const char* const wish = std::getenv("OSTRA_LONG");
-    return wish != nullptr && wish[0] == '1' ? OSTRA_MUTATED_IMAGES * 10 : OSTRA_MUTATED_IMAGES;
-}
-
 /// Changes to a fresh image, most of them where it describes itself, and to the sizes of its values.
 Bytes RandomRecords(std::uint32_t seed) {
     std::minstd_rand random(seed + 1);
@@ -48,7 +42,8 @@ Bytes RandomRecords(std::uint32_t seed) {
 }
 
 TEST(MutatedImages, GiveAModelThatRoundTripsOrADocumentedException) {
-    const std::uint32_t count = ImageCount();
+    const char* const isLong = std::getenv("OSTRA_LONG");
+    const std::uint32_t count = OSTRA_MUTATED_IMAGES * (isLong != nullptr && *isLong == '1' ? 10 : 1);
     std::array<std::uint32_t, 4> outcomes{};
     for (std::uint32_t seed = 0; seed < count; ++seed) {
         const Bytes records = RandomRecords(seed);

@@ -17,8 +17,7 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace {
 
 using namespace Generic::Configuration;
-using Generic::Utilities::DataException;
-using Generic::Utilities::IOException;
+using namespace Generic::Utilities;
 using testing::IsEmpty;
 using Tests::ExpectThrow;
 using Varnholt::Utilities::Exceptions::ResourceException;

@@ -10,7 +10,6 @@ namespace {
 using namespace Platform;
 using DeviceDriver::Ostra::LowLevel::PellandoUSBDevice;
 using DeviceDriver::Ostra::USB::USBBrowser;
-using testing::ElementsAreArray;
 
 class Browser : public TransportTest {};
 

@@ -13,16 +13,10 @@ namespace Varnholt::Tests {
 namespace {
 
 using namespace Platform;
-using DeviceDriver::Generic::MessageButtonData;
-using DeviceDriver::Generic::MessageDeviceGone;
-using DeviceDriver::Ostra::LowLevel::PellandoUSBDevice;
-using DeviceDriver::Ostra::LowLevel::ScanRecordList;
-using DeviceDriver::Ostra::LowLevel::USBConnection;
+using namespace DeviceDriver::Generic;
+using namespace DeviceDriver::Ostra::LowLevel;
 using Protocol::NativeDriver::ControlBlock;
-using testing::ElementsAre;
-using testing::IsEmpty;
-using Varnholt::Utilities::Multithreading::Mutex;
-using Varnholt::Utilities::Multithreading::ScopedLock;
+using namespace Varnholt::Utilities::Multithreading;
 
 constexpr std::uint32_t InterruptPipe = 3;
 const Answer ButtonData{.data = {1}};
@@ -145,18 +139,6 @@ TEST_F(NativeDevice, OpensItsPipesAndClosesThemInReverse) {
                             "control 220011 00 02 00 00 D0 00 03 00 00 00 / 00 00 00 00 00 00 00 00",
                             "cancel 3", "close native/1\\PIPE03", "close native/1\\PIPE02",
                             "close native/1\\PIPE01", "close native/1"));
-}
-
-TEST_F(NativeDevice, SaysNothingOfAButtonThatWasUsed) {
-    auto device = Open();
-    driver_.Complete(InterruptPipe, ButtonData);
-    WaitUntil([&] { return !listener_.Codes().empty() && IsListening(); });
-    driver_.Script(1, {.data = {7}});
-    EXPECT_NO_THROW(ReadOneByte(*device)) << "only the end of the instrument closes its pipes";
-    driver_.TakeTranscript();
-    device.reset();
-    EXPECT_THAT(driver_.TakeTransfers(), ElementsAre("cancel 3"));
-    EXPECT_THAT(listener_.Codes(), ElementsAre(MessageButtonData));
 }
 
 TEST_F(NativeDevice, ThatCannotBeOpenedLeavesNothingBehind) {

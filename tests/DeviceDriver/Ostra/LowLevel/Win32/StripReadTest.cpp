@@ -10,10 +10,7 @@ namespace Varnholt::Tests {
 namespace {
 
 using namespace Platform;
-using DeviceDriver::Ostra::LowLevel::PellandoUSBDevice;
-using DeviceDriver::Ostra::LowLevel::ScanRecordList;
-using testing::ElementsAre;
-using testing::IsEmpty;
+using namespace DeviceDriver::Ostra::LowLevel;
 
 constexpr std::uint32_t ReadPipe = 1;
 constexpr std::uint32_t Timeout = 1000;

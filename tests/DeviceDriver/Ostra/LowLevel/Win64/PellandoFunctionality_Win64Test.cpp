@@ -14,10 +14,8 @@ namespace Varnholt::Tests {
 namespace {
 
 using namespace Protocol::UsbIoDriver;
-using DeviceDriver::Ostra::LowLevel::PellandoFunctionality_Win64;
-using DeviceDriver::Ostra::LowLevel::ScanReceiver;
+using namespace DeviceDriver::Ostra::LowLevel;
 using Protocol::BulkInEndpoint;
-using testing::ElementsAreArray;
 
 /// A host on which USBIO is the transport.
 class UsbIoTest : public DriverTest {
