@@ -18,6 +18,8 @@ class Away final {
 
     /// Threads that are away, and those that are just coming back.
     static int Count() { return count.load(); }
+    /// In a forked process, where there are no other threads.
+    static void ForgetOthers() { count = 0; }
 
   private:
     class Counted final {

@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cstdio>
 
+#include "Away.h"
 #include "Platform/Drivers/DriverFileSystem.h"
 #include "Platform/Usb/SimulatorBus.h"
 #include "Platform/Usb/SystemUsbBus.h"
@@ -35,7 +36,10 @@ Host& Host::Instance() {
 }
 
 Host::Host() : files_(Platform::Drivers::MakeDriverFileSystem(bus_)) {
-    pthread_atfork(nullptr, nullptr, [] { isForked = true; });
+    pthread_atfork(nullptr, nullptr, [] {
+        isForked = true;
+        Away::ForgetOthers();
+    });
 }
 
 void Host::CheckUsable() const {

@@ -2,9 +2,11 @@
 
 #include <sched.h>
 #include <sys/prctl.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <chrono>
+#include <memory>
 #include <utility>
 
 #include "Platform/Linux/Dispatcher.h"
@@ -21,6 +23,26 @@ namespace {
 
 /// The death of a process changes nothing that could be awaited, so that is looked for this often.
 constexpr Microseconds LongestAwait = 50'000;
+
+/// A scheduler that ends with the library, but not in a forked process, which has none of the threads that
+/// would be waited for.
+class SchedulerOfProcess final {
+  public:
+    explicit SchedulerOfProcess(RealScheduler::Starter startThread) : scheduler_(startThread) {}
+    ~SchedulerOfProcess() {
+        if (getpid() == process_) {
+            std::destroy_at(&*scheduler_);
+        }
+    }
+    SchedulerOfProcess(const SchedulerOfProcess&) = delete;
+    SchedulerOfProcess& operator=(const SchedulerOfProcess&) = delete;
+
+    RealScheduler& operator*() { return *scheduler_; }
+
+  private:
+    const pid_t process_ = getpid();
+    NoDestructor<RealScheduler> scheduler_;
+};
 
 }  // namespace
 
@@ -41,7 +63,7 @@ WallTime RealClock::Wall() {
 }
 
 EventScheduler& RealClock::Scheduler() {
-    static RealScheduler scheduler([](std::function<void()> run) {
+    static SchedulerOfProcess scheduler([](std::function<void()> run) {
         const HostSignalsBlocked blocked;
         return std::thread([run = std::move(run)] {
             // Events are for their time, not for up to 50 us later.
@@ -50,7 +72,7 @@ EventScheduler& RealClock::Scheduler() {
             run();
         });
     });
-    return scheduler;
+    return *scheduler;
 }
 
 /// False when there are no events for the thread to handle.

@@ -2,8 +2,12 @@
 #include <signal.h>
 
 #include <array>
+#include <cstdlib>
 
+#include "ForkedProcess.h"
+#include "Platform/EventScheduler.h"
 #include "Platform/Linux/HostSignalsBlocked.h"
+#include "Platform/Linux/RealClock.h"
 #include "Support/SignalMasks.h"
 #include "TestThread.h"
 
@@ -36,6 +40,17 @@ TEST(HostSignals, ComeBackAsTheyWere) {
     }
     EXPECT_EQ(state(), (std::array{false, true, true}));
     pthread_sigmask(SIG_SETMASK, &before, nullptr);
+}
+
+TEST(HostProcess, EndsInAForkedChildWhileAnEventIsAwaited) {
+    EventScheduler& scheduler = Linux::RealClock::Instance().Scheduler();
+    const auto event = scheduler.CallAt(scheduler.Now() + 60'000'000, [] {});
+    ForkedProcess child([]() -> int {
+        alarm(20);
+        std::exit(7);
+    });
+    EXPECT_EQ(child.WaitForExit(), 7);
+    scheduler.Forget(event);
 }
 
 }  // namespace
