@@ -30,7 +30,7 @@ def package(transport, records, rate):
 
 
 for transport in ("native", "usbio"):
-    for rate, records in ((USB_SPEED, 200_000), (0, 200_000)):
+    for rate, records in ((USB_SPEED, 200_000), (0, 1_000_000)):
         figures = {core: [], package: []}
         for _ in range(ROUNDS):
             for side in (core, package):

@@ -168,10 +168,10 @@ class Readout:
 class Scan:
     """A scan that runs: an iterator over what has come, and a context manager that ends it.
 
-    Each step answers all records that have come since the last one, at least one: int32, shape (n, record_size
-    / 2), in the order and with the signs of the wire (unlike in a readout, the first and the last value are as
-    they came); with ``raw`` uint8, shape (n, record_size). The scan runs on a thread of its own; when 1 MiB
-    waits, the instrument does. Records that came before a failure are handed out before it is raised.
+    Each step answers the next records that have come, at least one and at most 256 KiB of them: int32, shape (n,
+    record_size / 2), in the order and with the signs of the wire (unlike in a readout, the first and the last
+    value are as they came); with ``raw`` uint8, shape (n, record_size). The scan runs on a thread of its own; when
+    1 MiB waits, the instrument does. Records that came before a failure are handed out before it is raised.
 
     Until it is at its end, the instrument can do nothing else. Ctrl-C, :meth:`close`, leaving the ``with``
     block and the end of the object's life end the scan and reset the instrument.
@@ -189,7 +189,7 @@ class Scan:
         return self
 
     def __next__(self) -> npt.NDArray[Any]:
-        block = self._stream.next(self._raw)
+        block = self._stream.next()
         if block is None:
             raise StopIteration
         self.records += len(block)
@@ -551,7 +551,7 @@ class Instrument:
         if wanted is not None and wanted % record_size != 0 and self._transport == "native":
             raise BadArgument(f"over the transport native total is a multiple of record_size: {wanted} is none")
         self._prepare(integration_time, parameters)
-        return Scan(self._core.scan(record_size, wanted or 0, timeout), record_size, raw, self._core.identifier)
+        return Scan(self._core.scan(record_size, wanted or 0, timeout, raw), record_size, raw, self._core.identifier)
 
     def stop_scan(self) -> None:
         """Ends a scan that runs, whoever has it. Harmless without one."""

@@ -155,9 +155,10 @@ std::shared_ptr<EventStream> Instrument::Events() {
 }
 
 std::shared_ptr<ScanStream> Instrument::Scan(std::uint32_t recordSize, std::uint32_t total,
-                                             std::uint32_t timeout) {
+                                             std::uint32_t timeout, bool asBytes) {
     const Turn turn(*this);
-    auto scan = Make<ScanStream>(shared_from_this(), Service::ScanSettings{recordSize, total, timeout});
+    auto scan =
+        Make<ScanStream>(shared_from_this(), Service::ScanSettings{recordSize, total, timeout}, asBytes);
     scan_ = scan;
     return scan;
 }

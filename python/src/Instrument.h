@@ -78,7 +78,8 @@ class Instrument final : public std::enable_shared_from_this<Instrument> {
     }
 
     std::shared_ptr<EventStream> Events();
-    std::shared_ptr<ScanStream> Scan(std::uint32_t recordSize, std::uint32_t total, std::uint32_t timeout);
+    std::shared_ptr<ScanStream> Scan(std::uint32_t recordSize, std::uint32_t total, std::uint32_t timeout,
+                                     bool asBytes);
     void StopScan();
     /// How often the instrument was reset behind the caller's back: what was prepared is gone then.
     int Resets() const { return resets_; }

@@ -86,7 +86,7 @@ py::handle Attribute(const char* module, const char* name) {
 bool IsInterruptible() {
     static const auto mainThread =
         py::object(Attribute("threading", "main_thread")().attr("ident")).cast<unsigned long>();
-    static const py::handle getHandler = Attribute("signal", "getsignal");
+    static const py::handle getHandler = Attribute("_signal", "getsignal");  // makes no enumerator of it
     static const py::handle ownHandler = Attribute("signal", "default_int_handler");
     return PyThread_get_thread_ident() == mainThread && getHandler(SIGINT).is(ownHandler);
 }

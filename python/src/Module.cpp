@@ -198,7 +198,7 @@ py::tuple WriteSafely(Instrument& instrument, const py::bytes& bytes, bool whole
 
 void AddInstrument(py::module_& module) {
     py::class_<ScanStream, std::shared_ptr<ScanStream>>(module, "ScanStream")
-        .def("next", &ScanStream::Next, py::arg("as_bytes"))
+        .def("next", &ScanStream::Next)
         .def("close", &ScanStream::Close)
         .def("is_running", &ScanStream::IsRunning)
         .def("received", &ScanStream::Received)
@@ -241,7 +241,8 @@ void AddInstrument(py::module_& module) {
         .def("read_eeprom", [](Instrument& instrument) { return BytesOf(instrument.Use(ReadEepromTwice)); })
         .def("write_eeprom", WriteSafely, py::arg("image"), py::arg("whole_pieces"), py::arg("with_backup"),
              py::arg("backup_file"))
-        .def("scan", &Instrument::Scan, py::arg("record_size"), py::arg("total"), py::arg("timeout"))
+        .def("scan", &Instrument::Scan, py::arg("record_size"), py::arg("total"), py::arg("timeout"),
+             py::arg("as_bytes"))
         .def("stop_scan", &Instrument::StopScan)
         .def("events", &Instrument::Events);
 }
