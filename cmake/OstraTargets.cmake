@@ -45,7 +45,9 @@ if(WIN32)
   target_link_options(ostra_options INTERFACE -static -Wl,--gc-sections)
 endif()
 if(OSTRA_SANITIZE)
-  target_compile_options(ostra_options INTERFACE -fsanitize=${OSTRA_SANITIZE} -fno-omit-frame-pointer -fno-sanitize-recover=all)
+  # Tests had better compile fast: it is the rest that is watched for undefined behaviour.
+  target_compile_options(ostra_options INTERFACE -fsanitize=${OSTRA_SANITIZE} -fno-omit-frame-pointer -fno-sanitize-recover=all
+    $<$<BOOL:$<TARGET_PROPERTY:OSTRA_IS_TEST>>:-fno-sanitize=undefined>)
   target_link_options(ostra_options INTERFACE -fsanitize=${OSTRA_SANITIZE})
 endif()
 
@@ -89,17 +91,20 @@ function(ostra_shipped TARGET FILE DESCRIPTION)
     BYPRODUCTS ${FILE}.debug VERBATIM)
 endfunction()
 
-# ostra_test(NAME SOURCES ... [LINK ...] [EXACT_TIME ...] [WAITS_LONG]): a GoogleTest program, run by ctest as one test
-# under its name. Where there is no virtual time, on Windows, the cases are left out that EXACT_TIME names (as in
-# --gtest_filter), because their outcome hangs on milliseconds or they take minutes, and a program that WAITS_LONG runs
-# as several tests side by side, each with its share of the cases.
+# ostra_test(NAME SOURCES ... [LINK ...] [EXACT_TIME ...] [WAITS_LONG] [ONE_THREAD]): a GoogleTest program, run by ctest
+# as one test under its name. What has ONE_THREAD only is nothing for ThreadSanitizer. Where there is no virtual time, on
+# Windows, the cases are left out that EXACT_TIME names (as in --gtest_filter), because their outcome hangs on
+# milliseconds or they take minutes, and a program that WAITS_LONG runs as several tests side by side, each with its share
+# of the cases.
 function(ostra_test NAME)
-  cmake_parse_arguments(ARG "WAITS_LONG" "" "SOURCES;LINK;EXACT_TIME" ${ARGN})
+  cmake_parse_arguments(ARG "WAITS_LONG;ONE_THREAD" "" "SOURCES;LINK;EXACT_TIME" ${ARGN})
   ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest $<$<TARGET_EXISTS:ostra_virtual_time>:ostra_virtual_time>)
   target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
-  set_target_properties(${NAME} PROPERTIES UNITY_BUILD OFF)  # tests name their fixtures as they like
-  if(OSTRA_SANITIZE)
-    target_compile_options(${NAME} PRIVATE -O0)  # what is tested is optimised; its tests had better compile fast
+  set_target_properties(${NAME} PROPERTIES OSTRA_IS_TEST ON UNITY_BUILD OFF)  # tests name their fixtures as they like
+  target_compile_options(${NAME} PRIVATE -O0)  # as compiling it takes longer than running it
+  if(ARG_ONE_THREAD AND OSTRA_SANITIZE STREQUAL "thread")
+    set_target_properties(${NAME} PROPERTIES EXCLUDE_FROM_ALL ON)
+    return()
   endif()
   set(COMMAND ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:${NAME}>)
   if(WIN32)

@@ -48,7 +48,7 @@ TEST_P(Schedulers, ForgetEvents) {
     const auto held = std::make_shared<int>();
     const auto forgotten = scheduler.CallAt(start + 60'000'000, [&called, held] { ++called; });
     SleepMilliseconds(5);  // what comes now is due before that for which a thread waits
-    EventScheduler::EventId own = 0;
+    std::atomic<EventScheduler::EventId> own = 0;  // a busy machine calls the event before that is known
     own = scheduler.CallAt(start + 10'000, [&] {
         scheduler.Forget(own);
         SignalEvent(done.Get());
