@@ -44,30 +44,26 @@ OSTRA_ON_BOTH_TRANSPORTS(MemoryCommandsTest);
 /// And the same command says the same of an image of the instrument.
 TEST_P(MemoryCommandsTest, ReadingChangesNothing) {
     WriteFile(image_, before_);
-    struct Case {
-        std::string command;
-        const char* image = "";  ///< what names an image instead; empty: not every command takes one
-    };
-    for (const Case& row : {
-             Case{"eeprom backup @backup"},
-             Case{"eeprom diff @image"},
-             Case{"eeprom show"},
-             Case{"eeprom show --json", "@image"},
-             Case{"eeprom check --json", "--image @image"},
-             Case{"calibration show --json", "--image @image"},
-             Case{"log show --json", "--image @image"},
-             Case{"ram show"},
-             Case{"binary get @block"},
-             Case{"word get --json", "--image @image"},
+    // The second names an image instead; not every command takes one.
+    for (const auto& [command, image] : std::vector<std::pair<std::string, std::string>>{
+             {"eeprom backup @backup", ""},
+             {"eeprom diff @image", ""},
+             {"eeprom show", ""},
+             {"eeprom show --json", "@image"},
+             {"eeprom check --json", "--image @image"},
+             {"calibration show --json", "--image @image"},
+             {"log show --json", "--image @image"},
+             {"ram show", ""},
+             {"binary get @block", ""},
+             {"word get --json", "--image @image"},
          }) {
         SetFaults("bulk-out 0+:stall");  // not even the same bytes are written once more
-        Succeed(row.command);
+        Succeed(command);
         ExpectUnchanged();
-        if (*row.image != '\0') {
+        if (!image.empty()) {
             auto ofInstrument = tool_.Json();
-            Succeed(row.command + " " + row.image);
             ofInstrument["source"] = image_;
-            EXPECT_EQ(tool_.Json(), ofInstrument);
+            EXPECT_EQ(JsonOf(command + " " + image), ofInstrument);
         }
     }
     EXPECT_EQ(ReadFile(backup_), before_);

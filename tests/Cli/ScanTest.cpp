@@ -115,45 +115,41 @@ TEST_P(ScanTest, ProgressOnATerminalAndASummary) {
 /// Whatever ends a scan too early: what came is kept, as whole records, and the exit code and the text say
 /// why it ended. The instrument can be used afterwards.
 TEST_P(ScanTest, WhatCameIsKept) {
-    struct Case {
-        const char* faults;
-        std::function<void(Service::Interruption& user)> event;  ///< after 5 s
-        ExitCode code;
-        const char* ended;
-        const char* text;
-        bool hasRecords = true;
-    };
     const auto interrupt = [](Service::Interruption& user) { user.Request(); };
     const auto unplug = [this](auto&) { host_.Bus().Unplug("sim"); };
-    const std::vector<Case> cases{
-        {"", interrupt, ExitCode::Interrupted, "interrupted", "scan interrupted; "},
-        {"", unplug, ExitCode::NoInstrument, "unplugged", ""},
-        {"bulk-in 4+:silent", {}, ExitCode::Timeout, "timeout", ""},
-        {"bulk-in 0+:silent", {}, ExitCode::Timeout, "timeout", "; nothing was recorded", false},
-        {"bulk-in 4:stall", {}, ExitCode::InputOutput, "failed", ""},
-        {"bulk-in 4:short=1000", {}, ExitCode::InputOutput, "short", " of 6400000 bytes came; "},
-    };
-    for (const Case& row : cases) {
+    const auto nothing = [](auto&) {};
+    // The event comes after 5 s.
+    for (const auto& [faults, event, code, ended, text, hasRecords] :
+         std::vector<std::tuple<const char*, std::function<void(Service::Interruption&)>, ExitCode,
+                                std::string, const char*, bool>>{
+             {"", interrupt, ExitCode::Interrupted, "interrupted", "scan interrupted; ", true},
+             {"", unplug, ExitCode::NoInstrument, "unplugged", "", true},
+             {"bulk-in 4+:silent", nothing, ExitCode::Timeout, "timeout", "", true},
+             {"bulk-in 0+:silent", nothing, ExitCode::Timeout, "timeout", "; nothing was recorded", false},
+             {"bulk-in 4:stall", nothing, ExitCode::InputOutput, "failed", "", true},
+             {"bulk-in 4:short=1000", nothing, ExitCode::InputOutput, "short", " of 6400000 bytes came; ",
+              true},
+         }) {
         for (const std::string how : {"counted", "discarded", "open-ended"}) {
-            if (how == "open-ended" && std::string(row.ended) == "short") {
+            if (how == "open-ended" && ended == "short") {
                 continue;  // it is as long as the instrument makes it
             }
-            SCOPED_TRACE(std::string(row.ended) + ", " + how + " " + row.faults);
+            SCOPED_TRACE(ended + ", " + how + " " + faults);
             auto& instrument = host_.Add("sim", Streaming(100'000'000, 100'000));
-            SetFaults(row.faults);
+            SetFaults(faults);
             Service::Interruption interruption;
             tool_.interruption = &interruption;
-            const auto event = After(5'000'000, [&] { row.event ? row.event(interruption) : void(); });
+            const auto ending = After(5'000'000, [&, event = event] { event(interruption); });
             const Stopwatch watch(clock_);
             Fail(std::string("scan --raw --json --timeout 2 --output @raw") +
                      (how == "discarded" ? " --discard" : "") +
                      (how != "open-ended" ? " --records 25000" : ""),
-                 row.code, row.text);
-            watch.ExpectAtMost(row.code == ExitCode::Interrupted ? 5'100 : 25'000);
-            Platform::ClockScheduler().Forget(event);
-            EXPECT_EQ(tool_.Json()["ended"], row.ended);
+                 code, text);
+            watch.ExpectAtMost(code == ExitCode::Interrupted ? 5'100 : 25'000);
+            Platform::ClockScheduler().Forget(ending);
+            EXPECT_EQ(tool_.Json()["ended"], ended);
 
-            const bool isKept = row.hasRecords && how != "discarded";
+            const bool isKept = hasRecords && how != "discarded";
             const std::string kept = folder_.Path("raw");
             EXPECT_EQ(tool_.Json()["file"], isKept ? nlohmann::json(kept) : nlohmann::json());
             if (isKept) {
@@ -170,7 +166,7 @@ TEST_P(ScanTest, WhatCameIsKept) {
             EXPECT_EQ(instrument.PendingTransfers(), 0u);
             EXPECT_FALSE(instrument.Claimed());
             tool_.interruption = nullptr;
-            if (row.code == ExitCode::Interrupted) {
+            if (code == ExitCode::Interrupted) {
                 EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 2u);
                 Succeed("readout");
             }

@@ -89,8 +89,6 @@ class PluggedInstrument final {
         Unplug();
         WaitFor([] { return !AnyPluggedIn(); });
     }
-    PluggedInstrument(const PluggedInstrument&) = delete;
-    PluggedInstrument& operator=(const PluggedInstrument&) = delete;
 
     void Unplug() { process_.reset(); }
 

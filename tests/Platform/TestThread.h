@@ -33,8 +33,6 @@ class TestThread final {
         EXPECT_TRUE(handle_);
     }
     ~TestThread() { Join(); }
-    TestThread(const TestThread&) = delete;
-    TestThread& operator=(const TestThread&) = delete;
 
     void Join() {
         if (handle_) {

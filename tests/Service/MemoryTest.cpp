@@ -186,84 +186,82 @@ TEST(ImageCheckTest, AFreshImage) {
     EXPECT_TRUE(IsSane(CheckImage(UsedImage())));
 }
 
-void SetEntry(EepromImage& image, std::uint32_t index, std::uint16_t id, std::uint32_t address) {
-    Protocol::StoreBig16(&image[Map::Table + 4 + 6 * index], id);
-    Protocol::StoreBig32(&image[Map::Table + 6 + 6 * index], address);
+using Patch = std::pair<std::uint32_t, EepromImage>;
+
+/// An entry of the table.
+Patch Entry(std::uint32_t index, std::uint16_t id, std::uint32_t address) {
+    EepromImage bytes(6);
+    Protocol::StoreBig16(&bytes[0], id);
+    Protocol::StoreBig32(&bytes[2], address);
+    return {Map::Table + 4 + 6 * index, bytes};
 }
 
 TEST(ImageCheckTest, FindsWhatIsWrong) {
-    using Image = EepromImage;
-    struct Case {
-        const char* name;
-        void (*damage)(Image& image);
-        const char* finding;
-        bool isSane;
-    };
-    for (const Case& row : {
-             Case{"erased", [](Image& image) { image.assign(8192, 0xFF); },
-                  "error table: version 65535 instead of 1", false},
-             Case{"length", [](Image& image) { Protocol::StoreBig16(&image[4098], 299); },
-                  "error table: length 299 instead of 300 to 512", false},
-             Case{"length between entries", [](Image& image) { Protocol::StoreBig16(&image[4098], 333); },
-                  "warning table: the length does not end with an entry", true},
-             Case{"main log", [](Image& image) { image[11] ^= 1; },
-                  "warning log: main copy: checksum 0x00000000 instead of 0x00000001", true},
-             Case{"used log", [](Image& image) { image[11] ^= 1; }, "ok log: the driver uses the second copy",
-                  true},
-             Case{"both logs",
-                  [](Image& image) {
-                      image[11] ^= 1;
-                      image[2048 + 11] ^= 1;
-                  },
-                  "error log: the driver uses an empty log", false},
-             Case{"other log",
-                  [](Image& image) {
-                      image[2048 + 3] = 1;
-                      image[2048 + 11] = 1;
-                  },
-                  "note log: the two copies hold different values", true},
-             Case{"address beyond the end", [](Image& image) { SetEntry(image, 26, 1000, 9000); },
-                  "error table: values that end outside the image: 1000", false},
-             Case{"negative address", [](Image& image) { SetEntry(image, 0, 10000, 0x80000000); },
-                  "error table: values that end outside the image: 10000", false},
-             Case{"overlap", [](Image& image) { SetEntry(image, 13, 11000, 100); },
-                  "error table: 10010 and 11000 overlap", false},
-             Case{"over the table", [](Image& image) { SetEntry(image, 54, 2, 4608); }, "error table", false},
-             Case{"unknown entry", [](Image& image) { SetEntry(image, 27, 1999, 4616); },
-                  "warning table: unknown identifiers: 1999", true},
-             Case{"missing value", [](Image& image) { SetEntry(image, 27, 1999, 4616); },
-                  "warning table: the calibration lacks 1001", true},
-             Case{"no checksum", [](Image& image) { SetEntry(image, 0, 1999, 0); },
-                  "error table: the driver refuses the image: id 10000 doesn't exist", false},
-             Case{"log elsewhere", [](Image& image) { SetEntry(image, 11, 10021, 1061); },
-                  "error log: the table has it elsewhere than the driver writes it", false},
-             Case{"second log elsewhere", [](Image& image) { SetEntry(image, 25, 3, 3116); },
-                  "warning log: the table has the second copy elsewhere than the driver writes it", true},
-             Case{"longer log",
-                  [](Image& image) {
-                      SetEntry(image, 12, 1, 1068);
-                      std::fill_n(image.begin() + 1064, 4, std::uint8_t{0});
-                  },
-                  "warning log: it reaches into the binary block", true},
-             Case{"gap in the calibration", [](Image& image) { SetEntry(image, 29, 1206, 4632); },
-                  "warning table: calibration values cannot be changed", true},
-             Case{"repeated", [](Image& image) { SetEntry(image, 28, 1001, 4616); },
-                  "warning table: 1 entries repeat an identifier", true},
-             Case{"no number", [](Image& image) { std::fill_n(image.begin() + 4608, 4, 0xFF); },
-                  "warning calibration: values that are no numbers: 1000", true},
-             Case{"binary block", [](Image& image) { image[1064] = image[4031] = 0; },
-                  "ok binary block: 2 of 1904 bytes used", true},
-             Case{"words", [](Image& image) { image[4032] = image[4035] = image[4095] = 0; },
-                  "ok raw words: 2 of 16 used", true},
-             Case{"rest", [](Image& image) { image[4756] = image[8191] = 0; },
-                  "note rest: 2 bytes behind the calibration data are used", true},
+    const EepromImage erased(8192, 0xFF), noFloat(4, 0xFF), nothing(4);
+    for (const auto& [name, patches, finding, isSane] :
+         std::vector<std::tuple<const char*, std::vector<Patch>, const char*, bool>>{
+             {"erased", {{0, erased}}, "error table: version 65535 instead of 1", false},
+             {"length", {{4098, {1, 43}}}, "error table: length 299 instead of 300 to 512", false},
+             {"between entries",
+              {{4098, {1, 77}}},
+              "warning table: the length does not end with an entry",
+              true},
+             {"main log",
+              {{11, {1}}},
+              "warning log: main copy: checksum 0x00000000 instead of 0x00000001",
+              true},
+             {"used log", {{11, {1}}}, "ok log: the driver uses the second copy", true},
+             {"both logs", {{11, {1}}, {2059, {1}}}, "error log: the driver uses an empty log", false},
+             {"other log",
+              {{2051, {1}}, {2059, {1}}},
+              "note log: the two copies hold different values",
+              true},
+             {"too far",
+              {Entry(26, 1000, 9000)},
+              "error table: values that end outside the image: 1000",
+              false},
+             {"negative",
+              {Entry(0, 10000, 0x80000000)},
+              "error table: values that end outside the image: 10000",
+              false},
+             {"overlap", {Entry(13, 11000, 100)}, "error table: 10010 and 11000 overlap", false},
+             {"over the table", {Entry(54, 2, 4608)}, "error table", false},
+             {"unknown entry", {Entry(27, 1999, 4616)}, "warning table: unknown identifiers: 1999", true},
+             {"missing value", {Entry(27, 1999, 4616)}, "warning table: the calibration lacks 1001", true},
+             {"no checksum",
+              {Entry(0, 1999, 0)},
+              "error table: the driver refuses the image: id 10000 doesn't exist",
+              false},
+             {"log elsewhere",
+              {Entry(11, 10021, 1061)},
+              "error log: the table has it elsewhere than the driver writes it",
+              false},
+             {"second log elsewhere",
+              {Entry(25, 3, 3116)},
+              "warning log: the table has the second copy elsewhere than the driver writes it",
+              true},
+             {"longer log",
+              {Entry(12, 1, 1068), {1064, nothing}},
+              "warning log: it reaches into the binary block",
+              true},
+             {"gap", {Entry(29, 1206, 4632)}, "warning table: calibration values cannot be changed", true},
+             {"repeated", {Entry(28, 1001, 4616)}, "warning table: 1 entries repeat an identifier", true},
+             {"no number", {{4608, noFloat}}, "warning calibration: values that are no numbers: 1000", true},
+             {"binary block", {{1064, {0}}, {4031, {0}}}, "ok binary block: 2 of 1904 bytes used", true},
+             {"words", {{4032, {0}}, {4035, {0}}, {4095, {0}}}, "ok raw words: 2 of 16 used", true},
+             {"rest",
+              {{4756, {0}}, {8191, {0}}},
+              "note rest: 2 bytes behind the calibration data are used",
+              true},
          }) {
         EepromImage image = FreshImage();
-        row.damage(image);
+        for (const auto& [address, bytes] : patches) {
+            std::ranges::copy(bytes, image.data() + address);
+        }
         const std::vector<ImageFinding> findings = CheckImage(image);
         const std::string text = Lines(findings);
-        EXPECT_NE(text.find(row.finding), std::string::npos) << row.name << ":\n" << text;
-        EXPECT_EQ(IsSane(findings), row.isSane) << row.name << ":\n" << text;
+        EXPECT_NE(text.find(finding), std::string::npos) << name << ":\n" << text;
+        EXPECT_EQ(IsSane(findings), isSane) << name << ":\n" << text;
     }
 }
 

@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <optional>
 #include <random>
 #include <tuple>
 
@@ -45,25 +46,15 @@ class RamAccessTest : public testing::Test {
         instrument_.p3 = static_cast<std::uint16_t>(p1 % 257);
         instrument_.p4 = static_cast<std::uint8_t>(p1 % 16);
     }
-    /// Stores what was just loaded; false when that changes anything.
-    bool IsKept() {
-        const State before = StateNow();
-        RamAccess ram(commands_);
-        try {
-            ram.Store(ram.Load());
-        } catch (const Service::Failure&) {
-            return false;
-        }
-        instrument_.commands.clear();
-        return StateNow() == before;
-    }
-
-    /// Stores an integration time; false when no mode takes it.
-    bool Store(float seconds) {
+    /// Stores what was just loaded, with an integration time of its own if one is given; false when no mode
+    /// takes it.
+    bool Store(std::optional<float> seconds) {
         RamAccess ram(commands_);
         auto set = ram.Load();
-        set.SetProperty(2009, Property(seconds));
-        set.SetProperty(2001, Property(0.0F));
+        if (seconds) {
+            set.SetProperty(2009, Property(*seconds));
+            set.SetProperty(2001, Property(0.0F));
+        }
         try {
             ram.Store(set);
         } catch (const Service::Failure&) {
@@ -71,6 +62,11 @@ class RamAccessTest : public testing::Test {
         }
         instrument_.commands.clear();
         return true;
+    }
+    /// Whether storing what was just loaded changes nothing.
+    bool IsKept() {
+        const State before = StateNow();
+        return Store(std::nullopt) && StateNow() == before;
     }
     std::uint32_t Random() { return static_cast<std::uint32_t>(random_()); }
 

@@ -43,8 +43,6 @@ class ServerThread final {
         close(tasks_[0]);
         close(tasks_[1]);
     }
-    ServerThread(const ServerThread&) = delete;
-    ServerThread& operator=(const ServerThread&) = delete;
 
     /// A name that no other test has.
     static std::string UniqueName(const std::string& stem) {

@@ -122,10 +122,9 @@ std::size_t ScriptedDriver::Running(std::optional<std::uint32_t> place) const {
                  : running_.size();
 }
 
-std::uint64_t ScriptedDriver::BytesIn(std::uint32_t place) const {
+std::uint64_t ScriptedDriver::BytesIn(std::uint32_t place) {
     const std::lock_guard held(lock_);
-    const auto found = bytesIn_.find(place);
-    return found == bytesIn_.end() ? 0 : found->second;
+    return bytesIn_[place];
 }
 
 bool ScriptedDriver::LoadEnumeration() {
@@ -143,13 +142,10 @@ std::vector<std::string> ScriptedDriver::ListInterfaces(const Protocol::Guid& in
 }
 
 Handle ScriptedDriver::Open(const std::string& path) {
-    std::function<ErrorCode()> action;
-    {
+    const auto action = [&] {
         const std::lock_guard held(lock_);
-        if (const auto found = openActions_.find(path); found != openActions_.end()) {
-            action = found->second;
-        }
-    }
+        return openActions_[path];
+    }();
     if (const ErrorCode refusal = action ? action() : Errors::Success; refusal != Errors::Success) {
         SetLastError(refusal);
         return InvalidHandle();
@@ -161,16 +157,14 @@ Handle ScriptedDriver::Open(const std::string& path) {
 }
 
 ScriptedDriver::File* ScriptedDriver::Find(Handle handle) {
-    {
-        const std::lock_guard held(lock_);
-        for (const std::unique_ptr<File>& file : files_) {
-            if (file.get() == handle && file->isOpen) {
-                return file.get();
-            }
-        }
+    const std::lock_guard held(lock_);
+    const auto found = std::ranges::find_if(
+        files_, [handle](const auto& file) { return file.get() == handle && file->isOpen; });
+    if (found == files_.end()) {
+        SetLastError(Errors::InvalidHandle);
+        return nullptr;
     }
-    SetLastError(Errors::InvalidHandle);
-    return nullptr;
+    return found->get();
 }
 
 bool ScriptedDriver::CloseFile(Handle handle) {

@@ -72,7 +72,7 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     std::size_t OpenFiles() const;
     std::size_t Running(std::optional<std::uint32_t> place = {}) const;  ///< 0: controls; without one: all
     /// What all reads of the place brought in together.
-    std::uint64_t BytesIn(std::uint32_t place) const;
+    std::uint64_t BytesIn(std::uint32_t place);
 
     /// What keeps the enumeration from being loaded.
     Platform::ErrorCode enumerationFailure = Platform::Errors::Success;

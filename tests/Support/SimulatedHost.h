@@ -20,8 +20,6 @@ class SimulatedHost final {
         Platform::Override64BitHost(transport == Transport::UsbIo);
     }
     ~SimulatedHost() { Platform::Override64BitHost(std::nullopt); }
-    SimulatedHost(const SimulatedHost&) = delete;
-    SimulatedHost& operator=(const SimulatedHost&) = delete;
 
     Simulator::SimulatedBus& Bus() { return bus_; }
     Simulator::SimulatedInstrument& Add(const std::string& name,

@@ -62,9 +62,6 @@ struct TestTransfer final : Platform::Usb::Transfer, private Platform::Usb::Tran
     }
     static constexpr std::uint8_t Untouched = 0xA5;
 
-    TestTransfer(const TestTransfer&) = delete;
-    TestTransfer& operator=(const TestTransfer&) = delete;
-
     /// True once it has completed; gives up after a time that is long for any of it.
     bool Wait(std::chrono::milliseconds patience = std::chrono::seconds(20)) {
         std::unique_lock lock(mutex_);

@@ -107,14 +107,8 @@ TEST_F(CUsbIoTest, AcceptsInterfaceVersions2From30On) {
 }
 
 TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
-    struct Case {
-        const char* name;
-        int number;
-        std::function<void()> arrange;
-        std::uint32_t expected;
-    };
     using Tests::FailCalls;
-    const std::vector<Case> cases{
+    const std::vector<std::tuple<const char*, int, std::function<void()>, std::uint32_t>> cases{
         {"no such device", 2, [] {}, Status::NoSuchDeviceInstance},
         {"negative number", -1, [] {}, Status::NoSuchDeviceInstance},
         {"file not found", 0, [&] { driver_.RefuseOpen("usbio/1", 2); }, Status::DeviceNotFound},
@@ -127,18 +121,18 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
         {"driver tells nothing", 1, [&] { driver_.Script(Control::GetDriverInfo, {}); },
          Status::VersionMismatch},
     };
-    for (const Case& row : cases) {
+    for (const auto& [name, number, arrange, expected] : cases) {
         CUsbIo device;
         {
             const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
-            row.arrange();
-            EXPECT_EQ(device.Open(row.number, list, &InterfaceClass), row.expected) << row.name;
+            arrange();
+            EXPECT_EQ(device.Open(number, list, &InterfaceClass), expected) << name;
         }
         Platform::InstallCallFilter({});
-        EXPECT_FALSE(device.IsOpen()) << row.name;
-        EXPECT_EQ(device.GetDevicePathName(), nullptr) << row.name;
-        EXPECT_EQ(driver_.OpenFiles(), 0U) << row.name;
-        EXPECT_EQ(Open(device, 1), Status::Success) << row.name;
+        EXPECT_FALSE(device.IsOpen()) << name;
+        EXPECT_EQ(device.GetDevicePathName(), nullptr) << name;
+        EXPECT_EQ(driver_.OpenFiles(), 0U) << name;
+        EXPECT_EQ(Open(device, 1), Status::Success) << name;
     }
     const Platform::DeviceList list = CUsbIo::CreateDeviceList(&InterfaceClass);
     EXPECT_EQ(CUsbIo().Open(0, list, nullptr), Status::InvalidFunctionParameter);

@@ -92,16 +92,13 @@ std::string StandInDriver::PlugIn() {
     Enumerate();
     const std::string part = std::string("#ostra#") + name + "#";
     std::string path;
-    WaitUntil(
-        [&] {
-            for (const std::string& listed : List()) {
-                if (listed.find(part) != std::string::npos) {
-                    path = listed;
-                }
-            }
-            return !path.empty();
-        },
-        "instrument to be listed");
+    const auto isListed = [&] {
+        for (const std::string& listed : List()) {
+            path = listed.find(part) != std::string::npos ? listed : path;
+        }
+        return !path.empty();
+    };
+    WaitUntil(isListed, "instrument to be listed");
     // The driver counts its instruments in the order of their arrival.
     plugged_.push_back({path, name, nextDevice_});
     return path;

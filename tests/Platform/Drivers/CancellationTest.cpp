@@ -25,23 +25,17 @@ namespace Native = Protocol::NativeDriver;
 /// How the reads of one round are ended besides by their data.
 enum class Ending { Cancel, AbortFromOtherThread, CloseFromOtherThread, CloseAtOnce };
 
-/// How fast the data come, and how long the threads pause in between.
-struct Pace {
-    std::uint64_t bytesPerSecond;
-    std::uint32_t longestPause;  ///< milliseconds
-};
-
 /// Two reads of an endless measurement are kept in flight, each ended by whichever comes first. All bytes
 /// that the instrument has given away must be in the buffers, in order and once: what it sends next follows
-/// on them.
+/// on them. The threads pause for so many milliseconds at most.
 class Round final {
   public:
-    Round(unsigned seed, const Pace& pace)
+    Round(unsigned seed, std::uint64_t bytesPerSecond, std::uint32_t longestPause)
         : random_(seed),
           ending_(static_cast<Ending>(seed % 4)),
-          longestPause_(pace.longestPause),
-          instrument_(bus_.Add(
-              "port1", {.scanBytes = std::uint64_t{1} << 40, .bytesPerSecond = pace.bytesPerSecond})) {}
+          longestPause_(longestPause),
+          instrument_(
+              bus_.Add("port1", {.scanBytes = std::uint64_t{1} << 40, .bytesPerSecond = bytesPerSecond})) {}
 
     void Play() {
         Request measure;
@@ -151,7 +145,6 @@ class Round final {
 
 TEST(Cancellation, LosesAndRepeatsNothingWhereThreadsRace) {
     constexpr unsigned Rounds = 4000;
-    constexpr Pace Hurry{300'000'000, 0};
     // Where threads and waits cost more there are fewer rounds.
     const auto end = std::chrono::steady_clock::now() + std::chrono::seconds(8);
     for (unsigned seed = 1; seed <= Rounds && !testing::Test::HasFailure(); ++seed) {
@@ -159,7 +152,7 @@ TEST(Cancellation, LosesAndRepeatsNothingWhereThreadsRace) {
             break;
         }
         SCOPED_TRACE(testing::Message() << "seed " << seed);
-        Round(seed, Hurry).Play();
+        Round(seed, 300'000'000, 0).Play();
     }
 }
 
@@ -167,12 +160,11 @@ TEST(Cancellation, LosesAndRepeatsNothingWhereThreadsRace) {
 // The same with an order of threads that the seed decides: a round that fails can be played again.
 TEST(Cancellation, LosesAndRepeatsNothingInAnySeededOrder) {
     constexpr unsigned Rounds = 5000;
-    constexpr Pace PacketAMillisecond{1000 * Simulator::BulkPacketSize, 5};
     int cutOff = 0;
     for (unsigned seed = 1; seed <= Rounds && !testing::Test::HasFailure(); ++seed) {
         SCOPED_TRACE(testing::Message() << "seed " << seed);
         const Simulator::VirtualClock clock(seed);
-        Round round(seed, PacketAMillisecond);
+        Round round(seed, 1000 * Simulator::BulkPacketSize, 5);  // a packet a millisecond
         round.Play();
         cutOff += round.CutOff();
     }

@@ -6,15 +6,13 @@
 #include <thread>
 
 #include "Platform/EventScheduler.h"
-#include "Platform/Threads.h"
+#include "Platform/TestThread.h"
 #include "Platform/Usb/LibUsbEvents.h"
 #include "Platform/WaitableObjects.h"
 #include "Support/SignalMasks.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
-
-constexpr std::uint32_t LongTimeout = 20'000;
 
 /// Threads that wait with a libusb context to look after, without a device.
 class LibUsbEventsTest : public testing::Test {
@@ -32,17 +30,6 @@ class LibUsbEventsTest : public testing::Test {
         libusb_exit(context_);
     }
 
-    static std::uint32_t Echo(void* test) {
-        auto& self = *static_cast<LibUsbEventsTest*>(test);
-        for (int i = 0; i < Rounds; ++i) {
-            if (Wait(self.there_.Get(), LongTimeout) != WaitResult::Signalled) {
-                return 1;
-            }
-            SignalEvent(self.back_.Get());
-        }
-        return 0;
-    }
-
     static constexpr int Rounds = 2000;
     libusb_context* context_ = nullptr;
     std::shared_ptr<LibUsbEvents> events_;
@@ -57,7 +44,11 @@ TEST_F(LibUsbEventsTest, ItsThreadTakesNoSignalOfTheHost) {
 /// Each is in libusb, or about to go there, when the other wakes it.
 TEST_F(LibUsbEventsTest, WaitsEndInTimeLoseNoSignalAndOutlastTheEvents) {
     EXPECT_EQ(Wait(back_.Get(), 30), WaitResult::TimedOut);
-    const OwnedHandle echo(StartThread(&LibUsbEventsTest::Echo, this));
+    const TestThread echo([this] {
+        for (int i = 0; i < Rounds && Wait(there_.Get(), LongTimeout) == WaitResult::Signalled; ++i) {
+            SignalEvent(back_.Get());
+        }
+    });
     for (int i = 0; i < Rounds; ++i) {
         if (i == Rounds / 2) {
             events_->HandleAlways();
@@ -67,7 +58,6 @@ TEST_F(LibUsbEventsTest, WaitsEndInTimeLoseNoSignalAndOutlastTheEvents) {
         SignalEvent(there_.Get());
         ASSERT_EQ(Wait(back_.Get(), LongTimeout), WaitResult::Signalled) << "round " << i;
     }
-    EXPECT_EQ(Wait(echo.Get(), LongTimeout), WaitResult::Signalled);
 }
 
 /// An aborted transfer, or the button's, may end when nobody waits.

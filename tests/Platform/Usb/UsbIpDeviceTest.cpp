@@ -159,33 +159,29 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
 }
 
 TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
-    struct Case {
-        const char* name;
-        std::uint32_t sequence;   ///< of the answer, from that of the submission on
-        std::uint32_t announced;  ///< bytes
-        std::size_t sent;         ///< bytes, with the header
-        bool leaves = false;
-    };
-    for (const Case& test : {
-             Case{"leaves", 0, 64, 0, true},
-             Case{"leaves amid the data", 0, 64, 48 + 32, true},
-             Case{"stops amid the data", 0, 64, 48 + 32},
-             Case{"stops in the middle of a header", 0, 64, 20},
-             Case{"answers what was not asked", 100, 0, 48},
-             Case{"sends too much", 0, 65, 48 + 65},
-             Case{"announces 4 GB", 0, 0xFFFFFFFF, 48},
+    // The answer's sequence number behind that of the submission, the bytes that it announces, those that are
+    // sent with the header, and whether the peer leaves.
+    for (const auto& [name, offset, announced, sent, leaves] :
+         std::vector<std::tuple<const char*, std::uint32_t, std::uint32_t, std::size_t, bool>>{
+             {"leaves", 0, 64, 0, true},
+             {"leaves amid the data", 0, 64, 48 + 32, true},
+             {"stops amid the data", 0, 64, 48 + 32, false},
+             {"stops in the middle of a header", 0, 64, 20, false},
+             {"answers what was not asked", 100, 0, 48, false},
+             {"sends too much", 0, 65, 48 + 65, false},
+             {"announces 4 GB", 0, 0xFFFFFFFF, 48, false},
          }) {
-        SCOPED_TRACE(test.name);
+        SCOPED_TRACE(name);
         const auto device = MakeClaimedDevice();
         TestTransfer first = TestTransfer::In(BulkInEndpoint, 64);
         TestTransfer second = TestTransfer::Out(BulkOutEndpoint, Bytes(64));
         ASSERT_EQ(Errors::Success, device->Submit(first));
         ASSERT_EQ(Errors::Success, device->Submit(second));
-        const std::uint32_t sequence = PeerReceivesPacket<UsbIp::SubmitPacket>().sequence + test.sequence;
-        Bytes reply = Join(UsbIp::Encode(UsbIp::SubmitReply{sequence, 0, test.announced}));
-        reply.resize(test.sent);
+        const std::uint32_t sequence = PeerReceivesPacket<UsbIp::SubmitPacket>().sequence + offset;
+        Bytes reply = Join(UsbIp::Encode(UsbIp::SubmitReply{sequence, 0, announced}));
+        reply.resize(sent);
         PeerSends(reply);
-        if (test.leaves) {
+        if (leaves) {
             ClosePeer();
         }
         for (TestTransfer* const each : {&first, &second}) {

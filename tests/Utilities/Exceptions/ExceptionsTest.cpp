@@ -1,6 +1,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <memory>
 #include <sstream>
 #include <vector>
 
@@ -129,22 +130,19 @@ TEST(Exceptions, VerboseTextShowsTheTraceAndASnapshotOfTheCause) {
 }
 
 TEST(SmartPointer, SharesAndReleases) {
-    struct Counted {
-        explicit Counted(int& counter) : alive(counter) { ++alive; }
-        ~Counted() { --alive; }
-        int& alive;
+    struct Owner {
+        std::shared_ptr<int> owned;
     };
-    int alive = 0;
+    const auto owned = std::make_shared<int>();
     {
-        Tools::SmartPointer<Counted> first(new Counted(alive));
-        Tools::SmartPointer<Counted> second(first);
+        Tools::SmartPointer<Owner> first(new Owner{owned});
+        Tools::SmartPointer<Owner> second(first);
         second = *&second;
-        first = Tools::SmartPointer<Counted>();
+        first = Tools::SmartPointer<Owner>();
         EXPECT_TRUE(first.IsEmpty());
-        EXPECT_EQ(alive, 1);
-        EXPECT_EQ(&second->alive, &alive);
+        EXPECT_EQ(second->owned.use_count(), 2);
     }
-    EXPECT_EQ(alive, 0);
+    EXPECT_EQ(owned.use_count(), 1);
 }
 
 TEST(LexicalCast, RefusesWhatDoesNotBeginWithTheTarget) {

@@ -227,24 +227,19 @@ TEST_F(ConditionTest, NeedsItsObjectsAndAMutexWithAName) {
 }
 
 TEST_F(ConditionTest, AFailedWakeUnlocksTheMutexAndKeepsNothingLocked) {
-    const struct {
-        const char* failing;
-        void (Condition::*wake)();
-        const char* message;
-        int woken;
-    } cases[] = {
+    const std::vector<std::tuple<const char*, void (Condition::*)(), const char*, int>> cases{
         {"ReleaseSemaphore", &Condition::signal, "Condition::signal() invalid condition!", 0},
         {"ReleaseSemaphore", &Condition::broadcast, "Condition::broadcast() unable to release semaphore!", 0},
         {"Wait", &Condition::broadcast, "Condition::broadcast() invalid event!", 2},
     };
     StartWaiters(2);
-    for (const auto& row : cases) {
+    for (const auto& [failing, wake, message, woken] : cases) {
         mutex_.Lock();
-        MakeFail(row.failing);
-        ExpectThrow<ResourceException>(row.message, [&] { (condition_.*row.wake)(); });
+        MakeFail(failing);
+        ExpectThrow<ResourceException>(message, [&, wake = wake] { (condition_.*wake)(); });
         Platform::InstallCallFilter({});
         EXPECT_TRUE(IsFree(mutex_, 1000)) << "must have been unlocked";
-        ExpectWoken(row.woken);
+        ExpectWoken(woken);
     }
     StartWaiters(1);
     Elsewhere([this] { condition_.signal(); });  // another thread gets into the state's own lock
@@ -259,24 +254,21 @@ TEST_F(ConditionTest, WaiterThatCannotTakeTheMutexAgainSaysSo) {
                 return isMeant && !std::exchange(done, true) ? action() : Platform::Errors::Success;
             });
     };
-    const struct {
-        const char* name;
-        void (Condition::*wake)();
-        const char* call;
-        bool fails;  ///< or else finds a mutex whose owner has ended
-    } cases[] = {{"woken alone", &Condition::signal, "Wait", true},
-                 {"last of a broadcast", &Condition::broadcast, "SignalAndWait", true},
-                 {"last, abandoned mutex", &Condition::broadcast, "SignalAndWait", false}};
-    for (const auto& row : cases) {
-        SCOPED_TRACE(row.name);
+    // The call fails, or else finds a mutex whose owner has ended.
+    const std::vector<std::tuple<const char*, void (Condition::*)(), const char*, bool>> cases{
+        {"woken alone", &Condition::signal, "Wait", true},
+        {"last of a broadcast", &Condition::broadcast, "SignalAndWait", true},
+        {"last, abandoned mutex", &Condition::broadcast, "SignalAndWait", false}};
+    for (const auto& [name, wake, call, fails] : cases) {
+        SCOPED_TRACE(name);
         StartWaiters(1);
-        onceAtTheWaiter(row.call, [this, fails = row.fails] {
+        onceAtTheWaiter(call, [this, fails = fails] {
             if (!fails) {
                 Elsewhere([this] { mutex_.Lock(); });
             }
             return fails ? Platform::Errors::InvalidHandle : Platform::Errors::Success;
         });
-        (condition_.*row.wake)();
+        (condition_.*wake)();
         Await(waiting_, 0);
         EXPECT_EQ(std::exchange(failure_, ""), "Condition::Wait() invalid mutex! (must be a real mutex)");
     }

@@ -154,38 +154,31 @@ TEST_F(EepromTest, LockGuardsWriteThrough) {
 
 TEST_F(EepromTest, BinaryAreasAreWrittenAndReadDirectly) {
     Load();
-    const struct {
-        std::uint16_t id;
-        std::size_t size;
-        const char* writes;
-        const char* refusal = nullptr;
-    } cases[] = {
+    const std::string wrongSize = "Wrong Tallimer size", denied = "EEPROM access denied";
+    const std::vector<std::tuple<std::uint16_t, std::size_t, std::string, std::string>> cases{
         {10100, 1904,
          "write 1064+256 write 1320+256 write 1576+256 write 1832+216 "
-         "write 3112+256 write 3368+256 write 3624+256 write 3880+152"},
-        {10100, 1903, "", "Wrong Tallimer size"},
-        {10100, 1905, "", "Wrong Tallimer size"},
-        {10200, 64, "write 4032+64"},
-        {10200, 65, "", "EEPROM access denied"},
-        {10215, 4, "write 4092+4"},
-        {10215, 5, "", "EEPROM access denied"},
-        {10216, 0, "", "EEPROM access denied"},
-        {10239, 0, "", "EEPROM access denied"},
-        {10240, 4, ""},
-        {10199, 4, ""},
-    };
-    for (const auto& row : cases) {
-        SCOPED_TRACE(testing::Message() << row.id << ", " << row.size << " bytes");
-        Bytes data(row.size);
+         "write 3112+256 write 3368+256 write 3624+256 write 3880+152",
+         ""},
+        {10100, 1903, "", wrongSize},
+        {10100, 1905, "", wrongSize},
+        {10200, 64, "write 4032+64", ""},
+        {10200, 65, "", denied},
+        {10215, 4, "write 4092+4", ""},
+        {10215, 5, "", denied},
+        {10216, 0, "", denied},
+        {10239, 0, "", denied},
+        {10240, 4, "", ""},
+        {10199, 4, "", ""}};
+    for (const auto& [id, size, writes, refusal] : cases) {
+        SCOPED_TRACE(testing::Message() << id << ", " << size << " bytes");
+        Bytes data(size);
         std::ranges::generate(data, [byte = std::uint8_t{0}]() mutable { return byte += 7; });
-        if (row.refusal) {
-            ExpectThrow<ResourceException>(row.refusal, [&] { eeprom_->StoreBinary(row.id, data); });
-        } else {
-            eeprom_->StoreBinary(row.id, data);
-        }
-        ExpectCommands(row.writes);
-        if (*row.writes != '\0' && row.size != 64) {
-            EXPECT_EQ(eeprom_->LoadBinary(row.id), data);
+        const auto store = [&, id = id] { eeprom_->StoreBinary(id, data); };
+        refusal.empty() ? store() : ExpectThrow<ResourceException>(refusal, store);
+        ExpectCommands(writes);
+        if (!writes.empty() && size != 64) {
+            EXPECT_EQ(eeprom_->LoadBinary(id), data);
             instrument_.TakeCommands();
         }
     }
@@ -206,25 +199,19 @@ TEST_F(EepromTest, DumpOfAFreshInstrumentIsTheFreshImage) {
 }
 
 TEST(EepromImages, ValuesThatChangedTheirSizeReadBackRight) {
-    const struct {
-        const char* name;
-        Resize resize;
-        ImageOutcome outcome = ImageOutcome::RoundTripRight;
-    } cases[] = {
-        {"in the middle", {3009, 3}},
-        {"the last value", {3013, 2}},
-        {"the first value", {1000, 40}},
-        {"shorter", {1002, 1}},
-        {"empty", {3011, 0}},
-        {"as long as fits", {3013, 860}},
-        {"longer", {3013, 861}, ImageOutcome::DumpRefused},
-        {"log in the middle", {10011, 130}},
-        {"log at the end", {10021, 2}},
-        {"log, shorter", {10010, 2}},
-    };
-    for (const auto& row : cases) {
-        EXPECT_EQ(CheckImage(Simulator::FreshEeprom(), {row.resize}), row.outcome) << row.name;
+    // In the middle, at the end and at the beginning; shorter, empty and as long as fits; and of the log.
+    for (const Resize& resize : {Resize{3009, 3},
+                                 {3013, 2},
+                                 {1000, 40},
+                                 {1002, 1},
+                                 {3011, 0},
+                                 {3013, 860},
+                                 {10011, 130},
+                                 {10021, 2},
+                                 {10010, 2}}) {
+        EXPECT_EQ(CheckImage(Simulator::FreshEeprom(), {resize}), ImageOutcome::RoundTripRight) << resize.id;
     }
+    EXPECT_EQ(CheckImage(Simulator::FreshEeprom(), {{3013, 861}}), ImageOutcome::DumpRefused);
 }
 
 TEST_F(EepromTest, DestructorWritesTheLogTwiceUpToAFailure) {

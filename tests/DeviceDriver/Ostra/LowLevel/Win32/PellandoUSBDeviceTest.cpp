@@ -60,17 +60,14 @@ void Transfer(USBConnection& connection, std::uint32_t pipe) {
 TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
     const Bytes data = Counting(64, 1);
     const Answer slow{.data = data, .after = Never, .cancelledAfter = 40, .cancelledWithData = true};
+    const Answer stalled{.data = data, .code = 31};
     const std::string timedOut = "Device IO control failed ", few = " data failed (Not enough data)";
     // Pipe 0 is a control. The operation returns after so many milliseconds, with this text of its failure.
     const std::vector<std::tuple<const char*, std::uint32_t, Answer, std::uint64_t, std::string>> cases{
         {"control, slow", 0, slow, 2041, timedOut + ErrorSuffix(Errors::IoPending)},
         {"control, not started", 0, {.refusal = 5}, 2001, timedOut + ErrorSuffix(5)},
         {"read, slow", 1, slow, 5104, "read data failed" + ErrorSuffix(Errors::IoIncomplete)},
-        {"read, stalled behind all data",
-         1,
-         {.data = data, .code = 31},
-         0,
-         "read data failed" + ErrorSuffix(31)},
+        {"read, stalled behind all data", 1, stalled, 0, "read data failed" + ErrorSuffix(31)},
         {"read, short", 1, {.data = Bytes(60)}, 0, "read" + few},
         {"read, longer", 1, {.data = data, .count = 65}, 0, "read" + few},
         {"write, short", 2, {.count = 63}, 0, "write" + few},
