@@ -26,8 +26,8 @@ Bytes Join(const Parts&... parts) {
 }
 
 /// An image whose pieces differ.
-inline Bytes CountingImage(unsigned first = 0) {
-    Bytes image(8192);
+inline Bytes CountingImage(unsigned first = 0, std::size_t size = 8192) {
+    Bytes image(size);
     for (std::size_t i = 0; i < image.size(); ++i) {
         image[i] = static_cast<std::uint8_t>(i * 7 + i / 256 + first);
     }

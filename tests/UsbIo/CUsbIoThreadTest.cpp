@@ -161,36 +161,34 @@ TEST_F(CUsbIoThreadTest, KeepsAReadRunningForEachBuffer) {
 
 TEST_F(CUsbIoThreadTest, EndsAfterTooManyErrorsInARow) {
     constexpr std::uint32_t Bad = Status::EndpointHalted, Down = Status::DevicePoweredDown;
-    struct Case {
-        const char* name;
-        std::vector<std::uint32_t> statuses;  ///< of the transfers; the next one would fail, too
-        std::uint32_t most = 2;
-    };
-    const auto run = [&](auto& stream, std::uint8_t endpoint, const Case& row) {
-        SCOPED_TRACE(row.name);
+    // Behind the transfers of these statuses another one would fail, too.
+    const auto run = [&](auto& stream, std::uint8_t endpoint, const auto& statuses, std::uint32_t most) {
         Bind(stream, endpoint);
-        auto errors = row.statuses;
+        auto errors = statuses;
         std::erase(errors, Status::Success);
-        for (const std::uint32_t status : row.statuses) {
+        for (const std::uint32_t status : statuses) {
             driver_.Script(endpoint, {.code = status, .after = 1});
         }
         driver_.Script(endpoint, {.code = Bad});
         ASSERT_TRUE(stream.AllocateBuffers(8, 1));
-        ASSERT_TRUE(row.most == 3 ? stream.StartThread() : stream.StartThread(row.most));
+        ASSERT_TRUE(most == 3 ? stream.StartThread() : stream.StartThread(most));
         EXPECT_TRUE(stream.WaitForExit());
         EXPECT_EQ(stream.Errors(), errors);
         EXPECT_TRUE(stream.ShutdownThread());
         driver_.DropScript(endpoint);
     };
-    for (const Case& row :
-         {Case{"at once", {Bad, Bad, Bad}}, Case{"a good one starts anew", {Bad, Bad, 0, Bad, Bad, Bad}},
-          Case{"powered down does not count", {Down, Down, Down, Down, Bad, Bad, Bad}},
-          Case{"three are not too many", {Bad, Bad, Bad, 0, Bad, Bad, Bad, Bad}, 3}}) {
+    for (const auto& [name, statuses, most] :
+         std::vector<std::tuple<const char*, std::vector<std::uint32_t>, std::uint32_t>>{
+             {"at once", {Bad, Bad, Bad}, 2},
+             {"a good one starts anew", {Bad, Bad, 0, Bad, Bad, Bad}, 2},
+             {"powered down does not count", {Down, Down, Down, Down, Bad, Bad, Bad}, 2},
+             {"three are not too many", {Bad, Bad, Bad, 0, Bad, Bad, Bad, Bad}, 3}}) {
+        SCOPED_TRACE(name);
         Reader reader;
-        run(reader, BulkInEndpoint, row);
+        run(reader, BulkInEndpoint, statuses, most);
         Writer writer;
         writer.writesWanted = 100;
-        run(writer, BulkOutEndpoint, row);
+        run(writer, BulkOutEndpoint, statuses, most);
     }
 }
 

@@ -32,10 +32,8 @@ struct Case {
 template <class Value>
 Case Of(const char* name, Value value, PropertyType type, const Longs& longs, const Floats& floats,
         const Bytes& bigEndian) {
-    return {
-        name,     Property(value), [value](Property& target) -> Property& { return target.Assign(value); },
-        type,     longs,           floats,
-        bigEndian};
+    const auto assign = [value](Property& target) -> Property& { return target.Assign(value); };
+    return {name, Property(value), assign, type, longs, floats, bigEndian};
 }
 
 TEST(Property, HoldsWhatItWasGivenWhateverWasThere) {

@@ -303,6 +303,7 @@ TEST_P(Commands, PassMessagesOnUntilTheListenerIsRemoved) {
         EXPECT_TRUE(driver_.Complete(Interrupts(), Answer{.data = {1}}));
         SleepMilliseconds(50);
         EXPECT_THAT(listener_.Codes(), ElementsAre(MessageButtonData)) << isRemoved;
+        EXPECT_NO_THROW(instrument.SetMeasureMode(1)) << "only the end of the instrument closes its pipes";
         instrument.removeListener(&listener_);
     }
 }

@@ -97,11 +97,7 @@ constexpr std::uint32_t Whole = 65536;
 
 /// Bytes of a stream, different from one 256-byte record to the next.
 Bytes Stream(std::size_t count) {
-    Bytes bytes(count);
-    for (std::size_t place = 0; place < count; ++place) {
-        bytes[place] = static_cast<std::uint8_t>(place * 7 + place / 256 * 13);
-    }
-    return bytes;
+    return CountingImage(0, count);
 }
 
 class UsbIoScan : public UsbIoTest {
