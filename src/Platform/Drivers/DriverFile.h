@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <memory>
 #include <span>
+#include <utility>
 
 #include "Platform/Drivers/SharedDevice.h"
 #include "Platform/ErrorCodes.h"
@@ -26,20 +27,28 @@ struct Decision {
     static Decision Send() { return {Kind::Send, Errors::Success, 0}; }
 };
 
+/// Ends what runs on an endpoint of a device, whichever file and thread started it.
+class EndpointCanceller {
+  public:
+    virtual ~EndpointCanceller() = default;
+    virtual void CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) = 0;
+};
+
 /// A driver's side of one open file: which requests it takes, what they become on the bus, and its codes. One
 /// per handle; destroyed when the handle is closed and all its requests have completed. All operations may be
 /// called from any thread.
 class DriverFile {
   public:
-    explicit DriverFile(std::shared_ptr<SharedDevice> shared) : device_(std::move(shared)) {}
+    DriverFile(std::shared_ptr<SharedDevice> shared, EndpointCanceller& endpointCanceller)
+        : device_(std::move(shared)), canceller_(endpointCanceller) {}
     virtual ~DriverFile() = default;
     DriverFile(const DriverFile&) = delete;
     DriverFile& operator=(const DriverFile&) = delete;
 
-    /// Decide on a read or write; buffer and length stand in `transfer`, which gets its endpoint. On the path
-    /// of every transfer: must not block.
-    virtual Decision Read(Usb::Transfer& transfer) = 0;
-    virtual Decision Write(Usb::Transfer& transfer) = 0;
+    /// Decides on a read (`in`) or write; buffer and length stand in `transfer`, which gets its endpoint. A
+    /// read of no bytes completes at once and reaches no endpoint; a write of no bytes is sent as an empty
+    /// packet. On the path of every transfer: must not block.
+    virtual Decision Move(bool in, Usb::Transfer& transfer) = 0;
     /// Decides on a device control, or carries it out. `output` is the data stage of a vendor request in
     /// either direction. May block where the device is set up.
     virtual Decision Control(std::uint32_t code, std::span<const std::uint8_t> input,
@@ -56,15 +65,15 @@ class DriverFile {
 
     SharedDevice& Device() const { return *device_; }
 
+  protected:
+    Decision Abort(std::uint8_t endpoint) const {
+        canceller_.CancelEndpoint(*device_, endpoint);
+        return Decision::Done(0);
+    }
+
   private:
     const std::shared_ptr<SharedDevice> device_;
-};
-
-/// Ends what runs on an endpoint of a device, whichever file and thread started it.
-class EndpointCanceller {
-  public:
-    virtual ~EndpointCanceller() = default;
-    virtual void CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) = 0;
+    EndpointCanceller& canceller_;
 };
 
 }  // namespace Varnholt::Platform::Drivers

@@ -25,20 +25,12 @@ std::uint8_t EndpointOfPipe(std::uint32_t pipe) {
     }
 }
 
-bool IsInEndpoint(std::uint8_t endpoint) {
-    return (endpoint & 0x80) != 0;
-}
-
-void FillVendorRequest(Usb::Transfer& transfer, const std::uint8_t* block, std::span<std::uint8_t> data) {
-    transfer.endpoint = 0;
-    transfer.setup.requestType =
-        block[Native::Block::Direction] == Native::DirectionIn ? Protocol::VendorIn : Protocol::VendorOut;
-    transfer.setup.request = block[Native::Block::Request];
-    transfer.setup.value = Protocol::LoadLittle16(block + Native::Block::Value);
-    transfer.setup.index = Protocol::LoadLittle16(block + Native::Block::Index);
-    transfer.setup.length = static_cast<std::uint16_t>(data.size());
-    transfer.data = data.data();
-    transfer.length = transfer.setup.length;
+Usb::SetupPacket SetupOf(const std::uint8_t* block) {
+    const bool in = block[Native::Block::Direction] == Native::DirectionIn;
+    return {.requestType = in ? Protocol::VendorIn : Protocol::VendorOut,
+            .request = block[Native::Block::Request],
+            .value = Protocol::LoadLittle16(block + Native::Block::Value),
+            .index = Protocol::LoadLittle16(block + Native::Block::Index)};
 }
 
 bool IsVendorRequest(const std::uint8_t* block) {
@@ -65,47 +57,28 @@ std::unique_ptr<NativeDriverFile> NativeDriverFile::Open(std::shared_ptr<SharedD
         throw;
     }
     if (file->endpoint_ != 0) {
-        bool found = false;
-        error = device.FindEndpoint(file->endpoint_, found);
-        if (error == Errors::Success && !found) {
-            error = Errors::FileNotFound;
-        }
+        error = device.FindEndpoint(file->endpoint_, Errors::FileNotFound);
     }
     return error == Errors::Success ? std::move(file) : nullptr;
 }
-
-NativeDriverFile::NativeDriverFile(std::shared_ptr<SharedDevice> shared, std::uint8_t pipeEndpoint,
-                                   EndpointCanceller& endpointCanceller)
-    : DriverFile(std::move(shared)), endpoint_(pipeEndpoint), canceller_(endpointCanceller) {}
 
 NativeDriverFile::~NativeDriverFile() {
     Device().Unclaim();
 }
 
-Decision NativeDriverFile::Read(Usb::Transfer& transfer) {
-    if (!IsInEndpoint(endpoint_)) {
+Decision NativeDriverFile::Move(bool in, Usb::Transfer& transfer) {
+    transfer.endpoint = endpoint_;
+    if (endpoint_ == 0 || transfer.IsIn() != in) {
         return Decision::Refuse(Errors::InvalidFunction);
     }
-    transfer.endpoint = endpoint_;
-    return transfer.length == 0 ? Decision::Done(0) : Decision::Send();
-}
-
-Decision NativeDriverFile::Write(Usb::Transfer& transfer) {
-    if (endpoint_ == 0 || IsInEndpoint(endpoint_)) {
-        return Decision::Refuse(Errors::InvalidFunction);
-    }
-    transfer.endpoint = endpoint_;
-    return Decision::Send();
+    return in && transfer.length == 0 ? Decision::Done(0) : Decision::Send();
 }
 
 Decision NativeDriverFile::Control(std::uint32_t code, std::span<const std::uint8_t> input,
                                    std::span<std::uint8_t> output, Usb::Transfer& transfer) {
-    if (endpoint_ != 0) {
-        return Decision::Refuse(Errors::InvalidFunction);
-    }
     const bool isKnown = code == Native::ControlVendorRequest || code == Native::ControlAbortPipe ||
                          code == Native::ControlButtonReport;
-    if (!isKnown) {
+    if (endpoint_ != 0 || !isKnown) {
         return Decision::Refuse(Errors::InvalidFunction);
     }
     if (input.size() != Native::ControlBlockSize) {
@@ -113,26 +86,22 @@ Decision NativeDriverFile::Control(std::uint32_t code, std::span<const std::uint
     }
     const std::uint8_t* const block = input.data();
     if (code == Native::ControlAbortPipe) {
-        const std::uint16_t named = Protocol::LoadLittle16(block + Native::Block::Value);
-        const auto address = static_cast<std::uint8_t>(named);
-        bool found = false;
-        const ErrorCode unknown = Device().FindEndpoint(address, found);
-        if (unknown != Errors::Success) {
-            return Decision::Refuse(unknown);
-        }
-        if (named != address || !found) {
-            return Decision::Refuse(Errors::InvalidParameter);
-        }
-        canceller_.CancelEndpoint(Device(), address);
-        return Decision::Done(0);
+        return AbortPipe(Protocol::LoadLittle16(block + Native::Block::Value));
     }
     const std::span<std::uint8_t> data =
         code == Native::ControlVendorRequest ? output : std::span<std::uint8_t>();
     if (!IsVendorRequest(block) || data.size() > std::numeric_limits<std::uint16_t>::max()) {
         return Decision::Refuse(Errors::InvalidParameter);
     }
-    FillVendorRequest(transfer, block, data);
+    transfer.MakeControl(SetupOf(block), data);
     return Decision::Send();
+}
+
+Decision NativeDriverFile::AbortPipe(std::uint16_t endpoint) const {
+    const auto address = static_cast<std::uint8_t>(endpoint);
+    const ErrorCode code = endpoint == address ? Device().FindEndpoint(address, Errors::InvalidParameter)
+                                               : Errors::InvalidParameter;
+    return code == Errors::Success ? Abort(address) : Decision::Refuse(code);
 }
 
 ErrorCode NativeDriverFile::OutcomeOf(Usb::TransferStatus status) const {
@@ -149,10 +118,6 @@ ErrorCode NativeDriverFile::OutcomeOf(Usb::TransferStatus status) const {
             break;
     }
     return Errors::GeneralFailure;
-}
-
-ErrorCode NativeDriverFile::RefusalOf(ErrorCode usbCode) const {
-    return usbCode;
 }
 
 }  // namespace Varnholt::Platform::Drivers

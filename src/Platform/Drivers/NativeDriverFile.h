@@ -12,8 +12,7 @@ namespace Varnholt::Platform::Drivers {
 /// the pipes below it. Every file has a share in the claim to the device.
 ///
 /// Requests of a kind that the file does not take end with `Errors::InvalidFunction`. The driver clears the
-/// halt of an endpoint before the next transfer on it, or with the last file. A read of no bytes completes at
-/// once and reaches no endpoint; a write of no bytes is sent as an empty packet.
+/// halt of an endpoint before the next transfer on it, or with the last file.
 class NativeDriverFile final : public DriverFile {
   public:
     /// Claims the device. Null on failure with the code in `error`; `Errors::FileNotFound` where the device
@@ -23,8 +22,7 @@ class NativeDriverFile final : public DriverFile {
                                                   EndpointCanceller& endpointCanceller, ErrorCode& error);
     ~NativeDriverFile() override;
 
-    Decision Read(Usb::Transfer& transfer) override;
-    Decision Write(Usb::Transfer& transfer) override;
+    Decision Move(bool in, Usb::Transfer& transfer) override;
     /// - `ControlVendorRequest`: the control block's request with `output` as its data stage.
     /// - `ControlAbortPipe`: ends the transfers of the endpoint that the block's value names.
     /// - `ControlButtonReport`: the block's request without a data stage, because what callers hand over as
@@ -33,14 +31,15 @@ class NativeDriverFile final : public DriverFile {
                      Usb::Transfer& transfer) override;
 
     ErrorCode OutcomeOf(Usb::TransferStatus status) const override;
-    ErrorCode RefusalOf(ErrorCode usbCode) const override;
+    ErrorCode RefusalOf(ErrorCode usbCode) const override { return usbCode; }
 
   private:
     NativeDriverFile(std::shared_ptr<SharedDevice> shared, std::uint8_t pipeEndpoint,
-                     EndpointCanceller& endpointCanceller);
+                     EndpointCanceller& endpointCanceller)
+        : DriverFile(std::move(shared), endpointCanceller), endpoint_(pipeEndpoint) {}
+    Decision AbortPipe(std::uint16_t endpoint) const;
 
     const std::uint8_t endpoint_;  ///< 0: the device itself
-    EndpointCanceller& canceller_;
 };
 
 }  // namespace Varnholt::Platform::Drivers

@@ -12,13 +12,8 @@ namespace {
 Decision Decide(DriverFile& driver, const Operation& operation, Usb::Transfer& transfer) {
     transfer.data = operation.data;
     transfer.length = operation.length;
-    switch (operation.kind) {
-        case Operation::Kind::Read:
-            return driver.Read(transfer);
-        case Operation::Kind::Write:
-            return driver.Write(transfer);
-        case Operation::Kind::Control:
-            break;
+    if (operation.kind != Operation::Kind::Control) {
+        return driver.Move(operation.kind == Operation::Kind::Read, transfer);
     }
     try {
         return driver.Control(operation.code, operation.input, {operation.data, operation.length}, transfer);

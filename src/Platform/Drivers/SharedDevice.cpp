@@ -54,17 +54,15 @@ bool SharedDevice::IsClaimed() {
     return claims_ > 0;
 }
 
-ErrorCode SharedDevice::FindEndpoint(std::uint8_t endpoint, bool& found) {
+ErrorCode SharedDevice::FindEndpoint(std::uint8_t endpoint, ErrorCode absent) {
     const std::lock_guard holder(setup_);
-    found = false;
-    if (!opened_) {
-        return Errors::Success;
-    }
     ErrorCode error = Errors::Success;
     const auto endpoints = opened_->Endpoints(error);
-    found = std::any_of(endpoints.begin(), endpoints.end(),
-                        [endpoint](const Usb::EndpointInfo& info) { return info.address == endpoint; });
-    return Note(error);
+    if (error != Errors::Success) {
+        return Note(error);
+    }
+    const auto found = std::ranges::find(endpoints, endpoint, &Usb::EndpointInfo::address);
+    return found != endpoints.end() ? Errors::Success : absent;
 }
 
 ErrorCode SharedDevice::Submit(Usb::Transfer& transfer) try {

@@ -24,8 +24,9 @@ class SharedDevice final {
     /// block.
     void Unclaim();
     bool IsClaimed();
-    /// Finds out whether the device, once claimed, has this endpoint. May block.
-    ErrorCode FindEndpoint(std::uint8_t endpoint, bool& found);
+    /// `absent` where a claimed device has no such endpoint, its code where that cannot be found out. May
+    /// block.
+    ErrorCode FindEndpoint(std::uint8_t endpoint, ErrorCode absent);
 
     /// Hands a transfer of a claimed device to it, after clearing a halt of its endpoint.
     ErrorCode Submit(Usb::Transfer& transfer);

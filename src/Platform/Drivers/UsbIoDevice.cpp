@@ -92,15 +92,11 @@ ErrorCode UsbIoDevice::Bind(std::uint8_t endpoint, Binding& binding) {
     if (binding != 0) {
         return Status::AlreadyBound;
     }
-    bool found = false;
-    const ErrorCode unknown = device_->FindEndpoint(endpoint, found);
-    if (unknown != Errors::Success) {
-        return UsbIoRefusalOf(unknown);
+    const ErrorCode code = device_->FindEndpoint(endpoint, Status::PipeNotFound);
+    if (code != Errors::Success) {
+        return code == Status::PipeNotFound ? code : UsbIoRefusalOf(code);
     }
-    if (!found) {
-        return Status::PipeNotFound;
-    }
-    if (std::find(bound_.begin(), bound_.end(), endpoint) != bound_.end()) {
+    if (std::ranges::find(bound_, endpoint) != bound_.end()) {
         return Status::AlreadyBound;
     }
     bound_.push_back(endpoint);

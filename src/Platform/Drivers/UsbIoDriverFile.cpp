@@ -63,7 +63,7 @@ Decision DriverInfo(std::span<std::uint8_t> output) {
 
 UsbIoDriverFile::UsbIoDriverFile(std::shared_ptr<UsbIoDevice> usbIoDevice,
                                  EndpointCanceller& endpointCanceller)
-    : DriverFile(usbIoDevice->Shared()), usbIo_(std::move(usbIoDevice)), canceller_(endpointCanceller) {}
+    : DriverFile(usbIoDevice->Shared(), endpointCanceller), usbIo_(std::move(usbIoDevice)) {}
 
 UsbIoDriverFile::~UsbIoDriverFile() {
     if (binding_ != 0) {
@@ -71,15 +71,7 @@ UsbIoDriverFile::~UsbIoDriverFile() {
     }
 }
 
-Decision UsbIoDriverFile::Read(Usb::Transfer& transfer) {
-    return Move(transfer, true);
-}
-
-Decision UsbIoDriverFile::Write(Usb::Transfer& transfer) {
-    return Move(transfer, false);
-}
-
-Decision UsbIoDriverFile::Move(Usb::Transfer& transfer, bool in) const {
+Decision UsbIoDriverFile::Move(bool in, Usb::Transfer& transfer) {
     transfer.endpoint = binding_.load(std::memory_order_relaxed);
     if (transfer.endpoint == 0) {
         return Decision::Refuse(Status::NotBound);
@@ -129,7 +121,7 @@ Decision UsbIoDriverFile::Control(std::uint32_t code, std::span<const std::uint8
 }
 
 Decision UsbIoDriverFile::VendorRequest(bool in, std::span<const std::uint8_t> block,
-                                        std::span<std::uint8_t> data, Usb::Transfer& transfer) {
+                                        std::span<std::uint8_t> data, Usb::Transfer& transfer) const {
     namespace Field = UsbIo::RequestBlock;
     if (Device().IsGone()) {
         return Decision::Refuse(Status::DeviceRemoved);
@@ -147,28 +139,21 @@ Decision UsbIoDriverFile::VendorRequest(bool in, std::span<const std::uint8_t> b
     if (!Device().IsClaimed()) {
         return Decision::Refuse(Status::NotConfigured);
     }
-    transfer.endpoint = 0;
-    transfer.setup.requestType =
-        static_cast<std::uint8_t>((in ? Protocol::VendorIn : Protocol::VendorOut) | reserved);
-    transfer.setup.request = block[Field::Request];
-    transfer.setup.value = Protocol::LoadLittle16(block.data() + Field::Value);
-    transfer.setup.index = Protocol::LoadLittle16(block.data() + Field::Index);
-    transfer.setup.length = static_cast<std::uint16_t>(data.size());
-    transfer.data = data.data();
-    transfer.length = transfer.setup.length;
+    const int requestType = (in ? Protocol::VendorIn : Protocol::VendorOut) | reserved;
+    transfer.MakeControl({.requestType = static_cast<std::uint8_t>(requestType),
+                          .request = block[Field::Request],
+                          .value = Protocol::LoadLittle16(block.data() + Field::Value),
+                          .index = Protocol::LoadLittle16(block.data() + Field::Index)},
+                         data);
     return Decision::Send();
 }
 
-Decision UsbIoDriverFile::AbortPipe() {
+Decision UsbIoDriverFile::AbortPipe() const {
     if (Device().IsGone()) {
         return Decision::Refuse(Status::DeviceRemoved);
     }
     const std::uint8_t endpoint = binding_.load();
-    if (endpoint == 0) {
-        return Decision::Refuse(Status::NotBound);
-    }
-    canceller_.CancelEndpoint(Device(), endpoint);
-    return Decision::Done(0);
+    return endpoint == 0 ? Decision::Refuse(Status::NotBound) : Abort(endpoint);
 }
 
 ErrorCode UsbIoDriverFile::OutcomeOf(Usb::TransferStatus status) const {
@@ -187,10 +172,6 @@ ErrorCode UsbIoDriverFile::OutcomeOf(Usb::TransferStatus status) const {
             return Status::DeviceRemoved;
     }
     return Status::RequestFailed;
-}
-
-ErrorCode UsbIoDriverFile::RefusalOf(ErrorCode usbCode) const {
-    return UsbIoRefusalOf(usbCode);
 }
 
 std::uint32_t UsbIoDriverFile::TimeLimitOf(const Usb::Transfer& transfer) const {

@@ -4,6 +4,7 @@
 #include <array>
 #include <cstdint>
 #include <memory>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -56,6 +57,14 @@ struct Transfer {
     void* deviceData = nullptr;      ///< for the device's own bookkeeping while the transfer runs
 
     bool IsIn() const { return endpoint == 0 ? setup.IsIn() : (endpoint & 0x80) != 0; }
+    /// Makes it a control transfer with this data stage.
+    void MakeControl(const SetupPacket& packet, std::span<std::uint8_t> dataStage) {
+        endpoint = 0;
+        setup = packet;
+        setup.length = static_cast<std::uint16_t>(dataStage.size());
+        data = dataStage.data();
+        length = setup.length;
+    }
 };
 
 class TransferClient {
@@ -78,8 +87,8 @@ class UsbDevice {
     /// Closes the device: transfers still running complete first.
     virtual ~UsbDevice() = default;
 
-    /// The endpoints of configuration 1, interface 0, alternate setting 0. Empty when they cannot be found
-    /// out, with the reason in `error`.
+    /// The endpoints of configuration 1, interface 0, alternate setting 0, of a claimed device. Empty when
+    /// they cannot be found out, with the reason in `error`.
     virtual std::vector<EndpointInfo> Endpoints(ErrorCode& error) = 0;
 
     /// Makes the device this process's own with its only configuration and interface; `Errors::Busy` when
