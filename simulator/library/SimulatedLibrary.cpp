@@ -14,7 +14,6 @@
 #include "Interface/HostCall.h"
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFileSystem.h"
-#include "Platform/SystemInterfaces.h"
 #include "Platform/Usb/SimulatorBus.h"
 #include "SchedulerInForce.h"
 #include "SimulatedBus.h"
@@ -146,14 +145,6 @@ namespace Varnholt::Platform {
 
 DeviceFileSystem& SystemDeviceFiles() {
     return Simulator::SimulatedLibrary::Instance().Files();
-}
-
-bool LoadSystemInterfaces() {
-    return true;
-}
-
-DeviceList MakeSystemList(const Protocol::Guid& interfaceClass, bool /*withRegistryFallback*/) {
-    return MakePathList(interfaceClass, SystemDeviceFiles().ListInterfaces(interfaceClass));
 }
 
 }  // namespace Varnholt::Platform

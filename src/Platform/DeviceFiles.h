@@ -5,6 +5,7 @@
 #include <string>
 #include <vector>
 
+#include "Platform/DeviceInterfaces.h"
 #include "Platform/ErrorCodes.h"
 #include "Platform/Handle.h"
 #include "Protocol/Guid.h"
@@ -39,6 +40,10 @@ class DeviceFileSystem {
     virtual bool LoadEnumeration() { return true; }
     /// The paths of the interfaces of `interfaceClass` that are present, in a stable order.
     virtual std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) = 0;
+    /// As `DeviceInterfaces::MakeList`.
+    virtual DeviceList MakeList(const Protocol::Guid& interfaceClass, bool /*withRegistryFallback*/) {
+        return std::make_shared<PathList>(interfaceClass, ListInterfaces(interfaceClass));
+    }
 
     /// Opens an existing device or pipe for reading and writing, shared, overlapped. `InvalidHandle()` on
     /// failure.

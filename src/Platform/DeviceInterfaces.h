@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "Platform/ErrorCodes.h"
@@ -19,13 +20,31 @@ class InterfaceList {
                                std::string& path) const = 0;
 };
 
+class PathList final : public InterfaceList {
+  public:
+    PathList(const Protocol::Guid& interfaceClass, std::vector<std::string> paths)
+        : class_(interfaceClass), paths_(std::move(paths)) {}
+
+    ErrorCode ReadPath(const Protocol::Guid& interfaceClass, std::uint32_t index,
+                       std::string& path) const override {
+        if (interfaceClass != class_ || index >= paths_.size()) {
+            return Errors::NoMoreItems;
+        }
+        path = paths_[index];
+        return Errors::Success;
+    }
+
+  private:
+    const Protocol::Guid class_;
+    const std::vector<std::string> paths_;
+};
+
 /// Null where no list could be made.
 using DeviceList = std::shared_ptr<const InterfaceList>;
 
 /// The platform's device-interface enumeration. On Windows this is setupapi, loaded at first use and unloaded
 /// at the end of the process; hosts that lack it are answered from the registry where `withRegistryFallback`
-/// says so. The paths come from the file system in force (`DeviceFiles`) where a test replaced it. Any
-/// thread.
+/// says so. Elsewhere the file system in force (`DeviceFiles`) lists paths. Any thread.
 class DeviceInterfaces final {
   public:
     /// Loads what the other operations need; false when it cannot be had. They load it themselves.
@@ -41,8 +60,5 @@ class DeviceInterfaces final {
     static ErrorCode ReadPath(const DeviceList& list, const Protocol::Guid& interfaceClass,
                               std::uint32_t index, std::string& path);
 };
-
-/// A list of these paths, where the platform has no enumeration of its own.
-DeviceList MakePathList(const Protocol::Guid& interfaceClass, std::vector<std::string> paths);
 
 }  // namespace Varnholt::Platform

@@ -3,7 +3,8 @@
 #include <cstddef>
 
 #include "Platform/CallFilter.h"
-#include "Platform/SystemInterfaces.h"
+#include "Platform/HostQueries.h"
+#include "Platform/Win32/RegistryInterfaces.h"
 #include "Platform/Win32/SetupApi.h"
 #include "Platform/Win32/Windows.h"
 
@@ -22,13 +23,27 @@ OVERLAPPED* SystemRecord(Overlapped& record) {
     return reinterpret_cast<OVERLAPPED*>(&record);
 }
 
+/// NT hosts before version 5 have no device-interface enumeration.
+bool HostKeepsInterfacesInRegistry() {
+    constexpr std::uint32_t NtFamily = 2;
+    const VersionRecord version = ReadVersionRecord();
+    return version.platformId == NtFamily && version.major < 5;
+}
+
 class WindowsDeviceFiles final : public DeviceFileSystem {
   public:
-    bool LoadEnumeration() override { return SystemSetupApi().Load() != nullptr; }
+    bool LoadEnumeration() override { return SystemSetupApi().Load(); }
+
+    DeviceList MakeList(const Protocol::Guid& interfaceClass, bool withRegistryFallback) override {
+        if (withRegistryFallback && HostKeepsInterfacesInRegistry()) {
+            return std::make_shared<PathList>(interfaceClass, ListRegistryInterfaces(interfaceClass));
+        }
+        return SystemSetupApi().MakeList(interfaceClass);
+    }
 
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override {
         std::vector<std::string> paths;
-        const DeviceList list = MakeSystemList(interfaceClass, true);
+        const DeviceList list = MakeList(interfaceClass, true);
         std::string path;
         for (std::uint32_t index = 0; list; ++index) {
             const ErrorCode code = list->ReadPath(interfaceClass, index, path);

@@ -2,6 +2,7 @@
 
 #include <mutex>
 
+#include "Platform/DeviceInterfaces.h"
 #include "Platform/Win32/Windows.h"
 //
 #include <setupapi.h>
@@ -24,15 +25,18 @@ class SetupApi final {
     SetupApi(const SetupApi&) = delete;
     SetupApi& operator=(const SetupApi&) = delete;
 
-    /// Null, with the reason in `LastError`, when the library or one of its entry points cannot be had.
-    const EntryPoints* Load();
+    /// False, with the reason in `LastError`, when the library or one of its entry points cannot be had.
+    bool Load();
+    /// The present interfaces of a class; null, with the reason in `LastError`, on failure. The list must not
+    /// outlive the object.
+    DeviceList MakeList(const Protocol::Guid& interfaceClass);
 
   private:
     void Unload();
 
     std::mutex lock_;
     HMODULE module_ = nullptr;   // guarded by lock
-    EntryPoints entryPoints_{};  // written under lock, before a caller has its address
+    EntryPoints entryPoints_{};  // written under lock, before `Load` says so
 };
 
 /// The process's own.
