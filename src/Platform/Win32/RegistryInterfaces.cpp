@@ -2,8 +2,9 @@
 
 #include <charconv>
 #include <cstdio>
-#include <optional>
+#include <memory>
 #include <string_view>
+#include <type_traits>
 
 #include "Platform/Win32/Windows.h"
 
@@ -16,35 +17,8 @@ constexpr const char* DevicePrefix = "\\\\.\\";
 /// The longest name of a registry value.
 constexpr std::size_t LongestName = 16383;
 
-class RegistryKey final {
-  public:
-    explicit RegistryKey(const char* path) {
-        if (::RegOpenKeyExA(HKEY_LOCAL_MACHINE, path, 0, KEY_QUERY_VALUE, &key_) != ERROR_SUCCESS) {
-            key_ = nullptr;
-        }
-    }
-    ~RegistryKey() {
-        if (key_ != nullptr) {
-            ::RegCloseKey(key_);
-        }
-    }
-    RegistryKey(const RegistryKey&) = delete;
-    RegistryKey& operator=(const RegistryKey&) = delete;
-
-    /// Nothing behind the last value, and where the key could not be opened.
-    std::optional<std::string> NameOfValue(DWORD index) const {
-        std::string name(LongestName + 1, '\0');
-        auto length = static_cast<DWORD>(name.size());
-        if (key_ == nullptr || ::RegEnumValueA(key_, index, name.data(), &length, nullptr, nullptr, nullptr,
-                                               nullptr) != ERROR_SUCCESS) {
-            return std::nullopt;
-        }
-        name.resize(length);
-        return name;
-    }
-
-  private:
-    HKEY key_ = nullptr;
+struct CloseKey {
+    void operator()(HKEY key) const { ::RegCloseKey(key); }
 };
 
 /// Reads `digits`, two per byte, into the bytes; false unless they are exactly that many hexadecimal digits.
@@ -79,13 +53,23 @@ bool NamesInterfaceOf(const Protocol::Guid& interfaceClass, const std::string& v
 
 std::vector<std::string> ListRegistryInterfaces(const Protocol::Guid& interfaceClass) {
     std::vector<std::string> paths;
-    const RegistryKey key(NotificationKey);
-    for (DWORD index = 0; const std::optional<std::string> name = key.NameOfValue(index); ++index) {
-        if (NamesInterfaceOf(interfaceClass, *name)) {
-            paths.push_back(DevicePrefix + *name);
+    HKEY opened = nullptr;
+    if (::RegOpenKeyExA(HKEY_LOCAL_MACHINE, NotificationKey, 0, KEY_QUERY_VALUE, &opened) != ERROR_SUCCESS) {
+        return paths;
+    }
+    const std::unique_ptr<std::remove_pointer_t<HKEY>, CloseKey> key(opened);
+    std::string buffer(LongestName + 1, '\0');
+    for (DWORD index = 0;; ++index) {
+        auto length = static_cast<DWORD>(buffer.size());
+        if (::RegEnumValueA(key.get(), index, buffer.data(), &length, nullptr, nullptr, nullptr, nullptr) !=
+            ERROR_SUCCESS) {
+            return paths;
+        }
+        const std::string name = buffer.substr(0, length);
+        if (NamesInterfaceOf(interfaceClass, name)) {
+            paths.push_back(DevicePrefix + name);
         }
     }
-    return paths;
 }
 
 }  // namespace Varnholt::Platform
