@@ -4,6 +4,7 @@
 #include <memory>
 #include <new>
 #include <string>
+#include <utility>
 
 #include "Platform/Linux/Clock.h"
 #include "Platform/Linux/SharedFile.h"
@@ -26,8 +27,8 @@ class ChangeCount final {
     std::uint32_t sleepers_ = 0;
 };
 
-/// Begins the content of every file; tells our memory from other content, and from that of a process with
-/// another layout of it.
+/// What the content of every file derives from; tells our memory from other content, and from that of a
+/// process with another layout of it.
 template <typename Content>
 struct Header {
     static constexpr std::uint64_t Magic = 0x4F53545241000000u + Content::Version;
@@ -43,12 +44,26 @@ std::unique_ptr<SharedFile> OpenContent(const std::string& kind, const std::stri
     return SharedFile::Open(
         kind, name,
         {.size = sizeof(Content),
-         .initialise =
-             [](void* memory, const void* argument) {
-                 return (new (memory) Content(*static_cast<const Content*>(argument)))->Initialise();
-             },
-         .isValid = [](const void* memory) { return static_cast<const Content*>(memory)->IsValid(); },
-         .argument = &initial});
+         .initialise = [&initial](void* memory) { return (new (memory) Content(initial))->Initialise(); },
+         .isValid = [](const void* memory) { return static_cast<const Content*>(memory)->IsValid(); }});
 }
+
+/// An object of the kind `Base` whose state stands in such a file.
+template <typename Base, typename Content>
+class SharedObject : public Base {
+  public:
+    explicit SharedObject(std::unique_ptr<SharedFile> opened)
+        : content_(*static_cast<Content*>(opened->Memory())), file_(std::move(opened)) {}
+
+    bool IsHeldElsewhere() const override { return true; }
+    std::uint32_t Changes() const final { return content_.changes.Get(); }
+    void AwaitChange(std::uint32_t seen, Microseconds limit) final { content_.changes.Await(seen, limit); }
+
+  protected:
+    Content& content_;
+
+  private:
+    const std::unique_ptr<SharedFile> file_;
+};
 
 }  // namespace Varnholt::Platform::Linux

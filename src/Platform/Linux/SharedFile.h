@@ -1,9 +1,13 @@
 #pragma once
 
 #include <cstddef>
+#include <functional>
 #include <memory>
 #include <string>
+#include <utility>
 
+#include "Platform/ErrorCodes.h"
+#include "Platform/Linux/FileDescriptor.h"
 #include "Platform/Linux/UserDirectory.h"
 
 namespace Varnholt::Platform::Linux {
@@ -20,9 +24,8 @@ class SharedFile final {
     /// `isValid` on what another process has made; the size must match as well.
     struct Content {
         std::size_t size;
-        bool (*initialise)(void* memory, const void* argument);
-        bool (*isValid)(const void* memory);
-        const void* argument;
+        std::function<bool(void* memory)> initialise;
+        std::function<bool(const void* memory)> isValid;
     };
 
     /// Null on failure with the reason in `LastError`: `Errors::InvalidData` for a file that is in use
@@ -34,21 +37,38 @@ class SharedFile final {
     SharedFile(const SharedFile&) = delete;
     SharedFile& operator=(const SharedFile&) = delete;
 
-    void* Memory() const;
+    void* Memory() const { return file_.memory.get(); }
 
     /// A name's file in the directory: the name with its unusual characters escaped, or shortened to its
     /// beginning and a hash.
     static std::string FileNameOf(const std::string& kind, const std::string& name);
 
   private:
-    class OpenFile;
-    struct Attempts;
-    SharedFile(std::unique_ptr<UserDirectory> usersDirectory, std::string fileName,
-               std::unique_ptr<OpenFile> opened);
+    /// A file that is open and mapped.
+    struct MappedFile {
+        struct Unmap {
+            std::size_t size;
+            void operator()(void* mapped) const;
+        };
+        FileDescriptor descriptor;
+        std::unique_ptr<void, Unmap> memory;
+
+        bool Map(std::size_t size);  ///< false with the reason in `errno`
+    };
+    /// An attempt to open the file may find it in motion: another process made it or let go of it at this
+    /// moment. One that failed has set `LastError`.
+    enum class Attempt { Succeeded, Failed, InMotion };
+
+    SharedFile(std::unique_ptr<UserDirectory> usersDirectory, std::string fileName)
+        : directory_(std::move(usersDirectory)), name_(std::move(fileName)) {}
+    static Attempt Fail(ErrorCode code);
+    Attempt OpenOrMake(const Content& content);
+    Attempt Make(const Content& content);
+    Attempt Join(const Content& content);
 
     const std::unique_ptr<UserDirectory> directory_;
     const std::string name_;
-    const std::unique_ptr<OpenFile> file_;
+    MappedFile file_;
 };
 
 }  // namespace Varnholt::Platform::Linux

@@ -9,16 +9,13 @@
 namespace Varnholt::Platform::Linux {
 namespace {
 
-struct MutexContent {
+struct MutexContent : Header<MutexContent> {
     static constexpr std::uint64_t Version = 1;
-    Header<MutexContent> header;
-    pthread_mutex_t mutex;
+    pthread_mutex_t mutex{};
     /// Of the mutex: its last owner ended, or let go of it, without a release.
-    std::uint32_t abandoned;
+    std::uint32_t abandoned = 0;
 
     bool Initialise() {
-        header = {};
-        abandoned = 0;
         pthread_mutexattr_t attributes;
         if (pthread_mutexattr_init(&attributes) != 0) {
             return false;
@@ -31,22 +28,16 @@ struct MutexContent {
         pthread_mutexattr_destroy(&attributes);
         return made;
     }
-    bool IsValid() const { return header.IsValid(); }
 };
 
 /// In this process the base class says which thread owns the mutex; only that thread locks the one that all
 /// processes see.
-class SharedMutex final : public MutexObject {
+class SharedMutex final : public SharedObject<MutexObject, MutexContent> {
   public:
-    explicit SharedMutex(std::unique_ptr<SharedFile> opened)
-        : file_(std::move(opened)), content_(*static_cast<MutexContent*>(file_->Memory())) {}
+    using SharedObject::SharedObject;
 
     bool CanBeTakenForOthers() const override { return false; }
     bool IsHeldElsewhere() const override { return !IsOwnedHere(); }
-    std::uint32_t Changes() const override { return content_.header.changes.Get(); }
-    void AwaitChange(std::uint32_t seen, Microseconds limit) override {
-        content_.header.changes.Await(seen, limit);
-    }
     std::string Describe() const override { return MutexObject::Describe() + " shared between processes"; }
 
   private:
@@ -64,11 +55,8 @@ class SharedMutex final : public MutexObject {
     void LetGo(bool isAbandoned) override {
         content_.abandoned = isAbandoned;
         pthread_mutex_unlock(&content_.mutex);
-        content_.header.changes.Increment();
+        content_.changes.Increment();
     }
-
-    const std::unique_ptr<SharedFile> file_;
-    MutexContent& content_;
 };
 
 }  // namespace

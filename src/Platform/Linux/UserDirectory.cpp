@@ -28,8 +28,8 @@ std::unique_ptr<UserDirectory> UserDirectory::Open(const std::string& above) {
             return nullptr;
         }
         // O_PATH asks for no permission: who owns the directory is told of others' too.
-        directory->descriptor_ = open(path, O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-        if (directory->descriptor_ < 0) {
+        directory->descriptor_ = FileDescriptor(open(path, O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+        if (!directory->descriptor_) {
             if (errno == ENOTDIR || errno == ELOOP || errno == ENOENT) {
                 continue;  // a file or link, or gone meanwhile
             }
@@ -37,17 +37,9 @@ std::unique_ptr<UserDirectory> UserDirectory::Open(const std::string& above) {
             return nullptr;
         }
         struct stat state {};
-        if (fstat(directory->descriptor_, &state) == 0 && state.st_uid == geteuid()) {
+        if (fstat(directory->Descriptor(), &state) == 0 && state.st_uid == geteuid()) {
             return directory;
         }
-        close(directory->descriptor_);
-        directory->descriptor_ = -1;
-    }
-}
-
-UserDirectory::~UserDirectory() {
-    if (descriptor_ >= 0) {
-        close(descriptor_);
     }
 }
 

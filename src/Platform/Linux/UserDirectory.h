@@ -3,6 +3,8 @@
 #include <memory>
 #include <string>
 
+#include "Platform/Linux/FileDescriptor.h"
+
 namespace Varnholt::Platform::Linux {
 
 /// The directory in the machine's shared memory that only this process's user can write in: what others do
@@ -19,19 +21,15 @@ class UserDirectory final {
     /// Makes it where it is absent. Null on failure with the reason in `LastError`.
     static std::unique_ptr<UserDirectory> Open(const std::string& above = SharedMemory);
 
-    ~UserDirectory();
-    UserDirectory(const UserDirectory&) = delete;
-    UserDirectory& operator=(const UserDirectory&) = delete;
-
     /// For the system's operations on what is in a directory.
-    int Descriptor() const { return descriptor_; }
+    int Descriptor() const { return descriptor_.Get(); }
     const std::string& Path() const { return path_; }
 
   private:
     UserDirectory() = default;
 
     std::string path_;
-    int descriptor_ = -1;
+    FileDescriptor descriptor_;
 };
 
 }  // namespace Varnholt::Platform::Linux

@@ -1,0 +1,36 @@
+#pragma once
+
+#include <unistd.h>
+
+#include <cerrno>
+#include <utility>
+
+namespace Varnholt::Platform::Linux {
+
+/// Owns a file descriptor and closes it, which leaves `errno` alone.
+class FileDescriptor final {
+  public:
+    explicit FileDescriptor(int owned = -1) : number_(owned) {}
+    FileDescriptor(FileDescriptor&& other) noexcept : number_(other.Release()) {}
+    FileDescriptor& operator=(FileDescriptor&& other) noexcept {
+        std::swap(number_, other.number_);
+        return *this;
+    }
+    ~FileDescriptor() {
+        if (number_ >= 0) {
+            const int error = errno;
+            close(number_);
+            errno = error;
+        }
+    }
+
+    int Get() const { return number_; }
+    explicit operator bool() const { return number_ >= 0; }
+    /// The descriptor is the caller's from here on.
+    int Release() { return std::exchange(number_, -1); }
+
+  private:
+    int number_;
+};
+
+}  // namespace Varnholt::Platform::Linux
