@@ -2,7 +2,6 @@
 
 #include <fcntl.h>
 #include <libusb-1.0/libusb.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -13,9 +12,11 @@
 #include <vector>
 
 #include "Platform/Linux/ErrnoCodes.h"
+#include "Platform/Linux/FileDescriptor.h"
 #include "Platform/Linux/HostSignalsBlocked.h"
 #include "Platform/Usb/LibUsbErrors.h"
 #include "Platform/Usb/LibUsbEvents.h"
+#include "Platform/Usb/ReleasedBy.h"
 #include "Protocol/Instrument.h"
 
 namespace Varnholt::Platform::Usb {
@@ -40,16 +41,16 @@ struct Submission {
     Submission& operator=(const Submission&) = delete;
 };
 
+using Context = std::unique_ptr<libusb_context, ReleasedBy<libusb_exit>>;
+using DeviceHandle = std::unique_ptr<libusb_device_handle, ReleasedBy<libusb_close>>;
+
 class LibUsbDevice final : public UsbDevice {
   public:
-    LibUsbDevice(int deviceFile, libusb_context* ownContext, libusb_device_handle* openHandle) try
-        : file_(deviceFile),
-          context_(ownContext),
-          handle_(openHandle),
-          events_(std::make_shared<LibUsbEvents>(ownContext)) {
-    } catch (...) {
-        CloseAll(deviceFile, ownContext, openHandle);
-    }
+    LibUsbDevice(Linux::FileDescriptor deviceFile, Context ownContext, DeviceHandle openHandle)
+        : file_(std::move(deviceFile)),
+          context_(std::move(ownContext)),
+          handle_(std::move(openHandle)),
+          events_(std::make_shared<LibUsbEvents>(context_.get())) {}
 
     ~LibUsbDevice() override {
         {
@@ -62,8 +63,6 @@ class LibUsbDevice final : public UsbDevice {
         }
         Release();
         events_->Stop();
-        spare_.clear();
-        CloseAll(file_, context_, handle_);
     }
 
     std::vector<EndpointInfo> Endpoints(ErrorCode& error) override;
@@ -72,7 +71,7 @@ class LibUsbDevice final : public UsbDevice {
     ErrorCode Submit(Transfer& transfer) override;
     void Cancel(Transfer& transfer) override;
     ErrorCode ClearHalt(std::uint8_t endpoint) override {
-        return ErrorFromLibUsb(libusb_clear_halt(handle_, endpoint));
+        return ErrorFromLibUsb(libusb_clear_halt(handle_.get(), endpoint));
     }
     std::shared_ptr<CompletionSource> CompletionsOf(std::uint8_t endpoint) override {
         return endpoint != Protocol::InterruptInEndpoint ? events_
@@ -82,12 +81,12 @@ class LibUsbDevice final : public UsbDevice {
   private:
     static void LIBUSB_CALL Completed(libusb_transfer* transfer);
     void Complete(Submission& submission);
-    static void CloseAll(int file, libusb_context* context, libusb_device_handle* handle);
     std::unique_ptr<Submission> TakeSpare();
 
-    const int file_;
-    libusb_context* const context_;
-    libusb_device_handle* const handle_;
+    // Closed in reverse order.
+    const Linux::FileDescriptor file_;
+    const Context context_;
+    const DeviceHandle handle_;
     const std::shared_ptr<LibUsbEvents> events_;
 
     std::mutex mutex_;  // guards what follows; never held while a client is called
@@ -98,16 +97,11 @@ class LibUsbDevice final : public UsbDevice {
     bool claimed_ = false;
 };
 
-void LibUsbDevice::CloseAll(int file, libusb_context* context, libusb_device_handle* handle) {
-    libusb_close(handle);
-    libusb_exit(context);
-    close(file);
-}
-
 std::vector<EndpointInfo> LibUsbDevice::Endpoints(ErrorCode& error) {
     std::vector<EndpointInfo> endpoints;
     libusb_config_descriptor* configuration = nullptr;
-    error = ErrorFromLibUsb(libusb_get_config_descriptor(libusb_get_device(handle_), 0, &configuration));
+    error =
+        ErrorFromLibUsb(libusb_get_config_descriptor(libusb_get_device(handle_.get()), 0, &configuration));
     if (error != Errors::Success) {
         return endpoints;
     }
@@ -127,16 +121,16 @@ ErrorCode LibUsbDevice::Claim() {
     if (claimed_) {
         return Errors::Success;
     }
-    libusb_set_auto_detach_kernel_driver(handle_, 1);
+    libusb_set_auto_detach_kernel_driver(handle_.get(), 1);
     const auto patienceEnds = std::chrono::steady_clock::now() + ClaimPatience;
     for (;;) {
         int configuration = 0;
-        int result = libusb_get_configuration(handle_, &configuration);
+        int result = libusb_get_configuration(handle_.get(), &configuration);
         if (result == LIBUSB_SUCCESS && configuration != ConfigurationValue) {
-            result = libusb_set_configuration(handle_, ConfigurationValue);
+            result = libusb_set_configuration(handle_.get(), ConfigurationValue);
         }
         if (result == LIBUSB_SUCCESS) {
-            result = libusb_claim_interface(handle_, InterfaceNumber);
+            result = libusb_claim_interface(handle_.get(), InterfaceNumber);
         }
         if (result == LIBUSB_SUCCESS) {
             claimed_ = true;
@@ -152,7 +146,7 @@ ErrorCode LibUsbDevice::Claim() {
 void LibUsbDevice::Release() {
     const std::lock_guard lock(mutex_);
     if (claimed_) {
-        libusb_release_interface(handle_, InterfaceNumber);
+        libusb_release_interface(handle_.get(), InterfaceNumber);
         claimed_ = false;
     }
 }
@@ -185,10 +179,10 @@ ErrorCode LibUsbDevice::Submit(Transfer& transfer) {
         if (!transfer.IsIn()) {
             std::copy_n(transfer.data, transfer.length, buffer.begin() + LIBUSB_CONTROL_SETUP_SIZE);
         }
-        libusb_fill_control_transfer(submission->transfer, handle_, buffer.data(), &LibUsbDevice::Completed,
-                                     submission.get(), 0);
+        libusb_fill_control_transfer(submission->transfer, handle_.get(), buffer.data(),
+                                     &LibUsbDevice::Completed, submission.get(), 0);
     } else {
-        libusb_fill_bulk_transfer(submission->transfer, handle_, transfer.endpoint, transfer.data,
+        libusb_fill_bulk_transfer(submission->transfer, handle_.get(), transfer.endpoint, transfer.data,
                                   static_cast<int>(transfer.length), &LibUsbDevice::Completed,
                                   submission.get(), 0);
         if (transfer.endpoint == Protocol::InterruptInEndpoint) {
@@ -247,8 +241,8 @@ void LibUsbDevice::Complete(Submission& submission) {
 }  // namespace
 
 std::shared_ptr<UsbDevice> OpenLibUsbDevice(const std::string& deviceNode, ErrorCode& error) {
-    const int file = open(deviceNode.c_str(), O_RDWR | O_CLOEXEC);
-    if (file < 0) {
+    Linux::FileDescriptor file(open(deviceNode.c_str(), O_RDWR | O_CLOEXEC));
+    if (!file) {
         error = Linux::CodeOf(errno);
         if (error == Errors::DeviceNotConnected) {
             error = Errors::FileNotFound;  // what was never open cannot be lost
@@ -261,18 +255,15 @@ std::shared_ptr<UsbDevice> OpenLibUsbDevice(const std::string& deviceNode, Error
         const Linux::HostSignalsBlocked blocked;  // libusb may start a thread
         result = libusb_init(&context);
     }
+    Context ownContext(context);
+    libusb_device_handle* handle = nullptr;
     if (result == LIBUSB_SUCCESS) {
-        libusb_device_handle* handle = nullptr;
-        result = libusb_wrap_sys_device(context, file, &handle);
-        if (result == LIBUSB_SUCCESS) {
-            error = Errors::Success;
-            return std::make_shared<LibUsbDevice>(file, context, handle);
-        }
-        libusb_exit(context);
+        result = libusb_wrap_sys_device(context, file.Get(), &handle);
     }
-    close(file);
     error = ErrorFromLibUsb(result);
-    return nullptr;
+    return result == LIBUSB_SUCCESS
+               ? std::make_shared<LibUsbDevice>(std::move(file), std::move(ownContext), DeviceHandle(handle))
+               : nullptr;
 }
 
 }  // namespace Varnholt::Platform::Usb

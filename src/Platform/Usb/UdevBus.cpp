@@ -18,6 +18,7 @@
 #include <string_view>
 
 #include "Platform/Usb/LibUsbDevice.h"
+#include "Platform/Usb/ReleasedBy.h"
 #include "Platform/Usb/UsbDescriptors.h"
 #include "Protocol/Instrument.h"
 
@@ -33,13 +34,6 @@ constexpr std::int64_t CoarsestTick = NanosecondsPerSecond / 20;
 /// dozens of them, and udev walks through /sys for each that it looks at.
 constexpr const char* PortPattern = "[1-9]*-[1-9]*";
 
-template <auto Release>
-struct ReleasedBy {
-    template <class T>
-    void operator()(T* object) const {
-        Release(object);
-    }
-};
 using Udev = std::unique_ptr<udev, ReleasedBy<udev_unref>>;
 using Enumeration = std::unique_ptr<udev_enumerate, ReleasedBy<udev_enumerate_unref>>;
 using Device = std::unique_ptr<udev_device, ReleasedBy<udev_device_unref>>;
