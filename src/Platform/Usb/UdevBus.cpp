@@ -5,8 +5,8 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <charconv>
 #include <cstdint>
+#include <cstring>
 #include <ctime>
 #include <filesystem>
 #include <fstream>
@@ -15,7 +15,6 @@
 #include <mutex>
 #include <optional>
 #include <set>
-#include <string_view>
 
 #include "Platform/Usb/LibUsbDevice.h"
 #include "Platform/Usb/ReleasedBy.h"
@@ -40,24 +39,6 @@ using Device = std::unique_ptr<udev_device, ReleasedBy<udev_device_unref>>;
 
 std::string Text(const char* text) {
     return text ? text : "";
-}
-
-/// "1-1.10" behind "1-1.2": numbers compare as numbers.
-std::vector<unsigned> PortNumbers(std::string_view name) {
-    std::vector<unsigned> numbers;
-    const char* place = name.data();
-    const char* const end = place + name.size();
-    while (place != end) {
-        unsigned number = 0;
-        const auto [next, error] = std::from_chars(place, end, number);
-        if (error == std::errc()) {
-            numbers.push_back(number);
-            place = next;
-        } else {
-            ++place;
-        }
-    }
-    return numbers;
 }
 
 /// The kernel's "1-1.2" as "usb-1p1p2". Between the numbers stand letters, because the name of an
@@ -112,7 +93,9 @@ std::vector<UsbDeviceInfo> ListDevices(bool registeredOnly) {
             devices.push_back(Describe(device.get()));
         }
     }
-    std::ranges::sort(devices, {}, [](const UsbDeviceInfo& info) { return PortNumbers(info.name); });
+    std::ranges::sort(devices, [](const UsbDeviceInfo& one, const UsbDeviceInfo& other) {
+        return strverscmp(one.name.c_str(), other.name.c_str()) < 0;  // port 10 behind port 2
+    });
     return devices;
 }
 
