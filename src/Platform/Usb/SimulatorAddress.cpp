@@ -5,11 +5,12 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <cstddef>
 #include <cstring>
 #include <string_view>
 #include <utility>
+
+#include "Platform/Linux/FileDescriptor.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
@@ -25,16 +26,11 @@ class Address final {
         size_ = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + 1 + path.size());
     }
 
-    int MakeSocket(int (*use)(int, const sockaddr*, socklen_t)) const {
+    Linux::FileDescriptor MakeSocket(int (*use)(int, const sockaddr*, socklen_t)) const {
         // Never waits: a connection is there at once, or the simulator has stopped taking them.
-        const int file = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
-        if (file >= 0 && use(file, reinterpret_cast<const sockaddr*>(&address_), size_) != 0) {
-            const int error = errno;
-            close(file);
-            errno = error;
-            return -1;
-        }
-        return file;
+        Linux::FileDescriptor file(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+        const bool isUsed = file && use(file.Get(), reinterpret_cast<const sockaddr*>(&address_), size_) == 0;
+        return isUsed ? std::move(file) : Linux::FileDescriptor();
     }
 
   private:
@@ -64,18 +60,14 @@ bool IsTrustedUser(std::uint32_t userId) {
 }
 
 int ListenAsSimulator(const std::string& name) {
-    const int file = Address(name).MakeSocket(bind);
+    Linux::FileDescriptor file = Address(name).MakeSocket(bind);
     // Beyond them a connection fails, so these are more than come while the simulator is busy.
     constexpr int waitingConnections = 256;
-    if (file >= 0 && listen(file, waitingConnections) != 0) {
-        close(file);
-        return -1;
-    }
-    return file;
+    return file && listen(file.Get(), waitingConnections) == 0 ? file.Release() : -1;
 }
 
 int ConnectToSimulator(const std::string& name) {
-    return Address(name).MakeSocket(connect);
+    return Address(name).MakeSocket(connect).Release();
 }
 
 }  // namespace Varnholt::Platform::Usb

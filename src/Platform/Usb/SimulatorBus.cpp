@@ -11,6 +11,7 @@
 #include <utility>
 
 #include "Platform/Linux/ErrnoCodes.h"
+#include "Platform/Linux/FileDescriptor.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/UsbIpDevice.h"
 
@@ -29,15 +30,10 @@ std::set<std::string> ListeningSockets() {
             continue;  // a desktop has hundreds of others
         }
         std::istringstream fields(line);
-        std::string address;
-        std::string references;
-        std::string protocol;
+        std::string other;
         unsigned long flags = 0;
-        std::string type;
-        std::string state;
-        std::string number;
         std::string path;
-        fields >> address >> references >> protocol >> std::hex >> flags >> type >> state >> number >> path;
+        fields >> other >> other >> other >> std::hex >> flags >> other >> other >> other >> path;
         if (fields && (flags & acceptsConnections) != 0 && path.starts_with(prefix)) {
             const std::string name = path.substr(prefix.size());
             if (IsSimulatorName(name)) {
@@ -48,58 +44,50 @@ std::set<std::string> ListeningSockets() {
     return sockets;
 }
 
-/// Root's would refuse anybody else, and root trusts no other user's.
-bool IsUsable(std::uint32_t userId) {
-    return userId == geteuid();
-}
-
 /// A connection whose other end was looked at.
 struct Connection {
-    int file = -1;
+    Linux::FileDescriptor file;
     PeerCredentials peer{};
     bool usable = false;
 };
 
+/// Nothing, with the reason in `errno`, where there is no connection.
 std::optional<Connection> Connect(const std::string& name) {
     Connection connection;
-    connection.file = ConnectToSimulator(name);
-    if (connection.file < 0) {
+    connection.file = Linux::FileDescriptor(ConnectToSimulator(name));
+    if (!connection.file) {
         return std::nullopt;
     }
-    if (const auto peer = CredentialsOfPeer(connection.file)) {
+    if (const auto peer = CredentialsOfPeer(connection.file.Get())) {
         connection.peer = *peer;
-        connection.usable = IsUsable(peer->userId);
+        // Root's would refuse anybody else, and root trusts no other user's.
+        connection.usable = peer->userId == geteuid();
     }
     return connection;
 }
 
 /// For the USB/IP client.
 int ConnectToUsable(const std::string& name, ErrorCode& error) {
-    const auto connection = Connect(name);
-    if (!connection) {
-        error =
-            Linux::CodeOf(errno) == Errors::AccessDenied ? Errors::AccessDenied : Errors::DeviceNotConnected;
-        return -1;
+    auto connection = Connect(name);
+    if (connection && connection->usable) {
+        error = Errors::Success;
+        return connection->file.Release();
     }
-    if (!connection->usable) {
-        close(connection->file);
-        error = Errors::AccessDenied;
-        return -1;
-    }
-    error = Errors::Success;
-    return connection->file;
+    const bool isDenied = connection || Linux::CodeOf(errno) == Errors::AccessDenied;
+    error = isDenied ? Errors::AccessDenied : Errors::DeviceNotConnected;
+    return -1;
 }
 
 UsbIpConnector ConnectorTo(const std::string& name) {
     return [name](ErrorCode& error) { return ConnectToUsable(name, error); };
 }
 
+/// As `Connect`, which it does.
 std::optional<SimulatorInfo> Describe(const std::string& name) {
     const auto connection = Connect(name);
     if (!connection) {
         return std::nullopt;
     }
-    close(connection->file);
     SimulatorInfo info;
     info.name = SimulatedPrefix + name;
     info.userId = connection->peer.userId;
@@ -140,17 +128,13 @@ class SimulatorsOfThisUser final : public UsbBus {
 
     std::shared_ptr<UsbDevice> Open(const std::string& prefixedName, ErrorCode& error) override {
         const std::string name = NameBehindPrefix(prefixedName);
-        const auto info = IsSimulatorName(name) ? Describe(name) : std::nullopt;
-        if (!info) {
-            error = Errors::FileNotFound;
-            return nullptr;
+        const auto connection = IsSimulatorName(name) ? Connect(name) : std::nullopt;
+        if (connection && connection->usable) {
+            error = Errors::Success;
+            return MakeUsbIpDevice(ConnectorTo(name), SimulatorBusId);
         }
-        if (!info->usable) {
-            error = Errors::AccessDenied;
-            return nullptr;
-        }
-        error = Errors::Success;
-        return MakeUsbIpDevice(ConnectorTo(name), SimulatorBusId);
+        error = connection ? Errors::AccessDenied : Errors::FileNotFound;
+        return nullptr;
     }
 
   private:
@@ -159,8 +143,8 @@ class SimulatorsOfThisUser final : public UsbBus {
         return name.starts_with(prefix) ? name.substr(prefix.size()) : "";
     }
     static bool IsUsableSimulator(const std::string& name) {
-        const auto info = Describe(name);
-        return info && info->usable;
+        const auto connection = Connect(name);
+        return connection && connection->usable;
     }
 };
 
