@@ -1,10 +1,9 @@
 #include "Platform/Usb/UsbIpSocket.h"
 
 #include <poll.h>
-#include <sys/eventfd.h>
 #include <sys/socket.h>
+#include <sys/timerfd.h>
 #include <sys/uio.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -23,32 +22,25 @@ int MillisecondsUntil(UsbIpSocket::Clock::time_point time) {
 
 }  // namespace
 
-UsbIpSocket::UsbIpSocket(int socketFile) : file_(socketFile), wake_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {}
-
-UsbIpSocket::~UsbIpSocket() {
-    close(file_);
-    if (wake_ >= 0) {
-        close(wake_);
-    }
-}
+UsbIpSocket::UsbIpSocket(int socketFile)
+    : file_(socketFile), limit_(timerfd_create(CLOCK_MONOTONIC, TFD_CLOEXEC)) {}
 
 void UsbIpSocket::ShutdownSending() {
-    shutdown(file_, SHUT_WR);
+    shutdown(file_.Get(), SHUT_WR);
 }
 
 void UsbIpSocket::Shutdown() {
-    shutdown(file_, SHUT_RDWR);
+    shutdown(file_.Get(), SHUT_RDWR);
 }
 
 void UsbIpSocket::ReceiveUntil(std::optional<Clock::time_point> time) {
-    {
-        const std::lock_guard lock(mutex_);
-        if (limit_ == time) {
-            return;
-        }
-        limit_ = time;
+    itimerspec setting{};  // with a time of 0 the timer stands still
+    if (time) {
+        const auto seconds = std::chrono::floor<std::chrono::seconds>(*time);
+        setting.it_value.tv_sec = seconds.time_since_epoch().count();
+        setting.it_value.tv_nsec = std::chrono::nanoseconds(*time - seconds).count();
     }
-    eventfd_write(wake_, 1);
+    timerfd_settime(limit_.Get(), TFD_TIMER_ABSTIME, &setting, nullptr);
 }
 
 bool UsbIpSocket::Send(std::span<const std::uint8_t> header, std::span<const std::uint8_t> payload) {
@@ -64,7 +56,7 @@ bool UsbIpSocket::Send(std::span<const std::uint8_t> header, std::span<const std
         msghdr message{};
         message.msg_iov = parts.data();
         message.msg_iovlen = count;
-        const ssize_t sent = sendmsg(file_, &message, MSG_NOSIGNAL | MSG_DONTWAIT);
+        const ssize_t sent = sendmsg(file_.Get(), &message, MSG_NOSIGNAL | MSG_DONTWAIT);
         if (sent > 0) {
             const std::size_t ofHeader = std::min(header.size(), static_cast<std::size_t>(sent));
             header = header.subspan(ofHeader);
@@ -78,7 +70,7 @@ bool UsbIpSocket::Send(std::span<const std::uint8_t> header, std::span<const std
         if (sent < 0 && errno != EAGAIN) {
             return false;
         }
-        pollfd state{file_, POLLOUT, 0};
+        pollfd state{file_.Get(), POLLOUT, 0};
         if (poll(&state, 1, MillisecondsUntil(patienceEnds)) == 0 && Clock::now() >= patienceEnds) {
             return false;
         }
@@ -87,7 +79,7 @@ bool UsbIpSocket::Send(std::span<const std::uint8_t> header, std::span<const std
 }
 
 bool UsbIpSocket::Receive(std::span<std::uint8_t> bytes, bool inMessage) {
-    if (wake_ < 0) {
+    if (!limit_) {
         return false;  // waits could not be ended in time
     }
     std::optional<Clock::time_point> patienceEnds;
@@ -103,8 +95,8 @@ bool UsbIpSocket::Receive(std::span<std::uint8_t> bytes, bool inMessage) {
             continue;
         }
         const bool direct = bytes.size() >= buffer_.size();
-        const ssize_t received = direct ? recv(file_, bytes.data(), bytes.size(), MSG_DONTWAIT)
-                                        : recv(file_, buffer_.data(), buffer_.size(), MSG_DONTWAIT);
+        const ssize_t received = direct ? recv(file_.Get(), bytes.data(), bytes.size(), MSG_DONTWAIT)
+                                        : recv(file_.Get(), buffer_.data(), buffer_.size(), MSG_DONTWAIT);
         if (received > 0) {
             if (direct) {
                 bytes = bytes.subspan(static_cast<std::size_t>(received));
@@ -112,47 +104,38 @@ bool UsbIpSocket::Receive(std::span<std::uint8_t> bytes, bool inMessage) {
                 bufferStart_ = 0;
                 bufferEnd_ = static_cast<std::size_t>(received);
             }
-            const auto now = Clock::now();
-            if (LimitIsBefore(now)) {
+            if (LimitHasPassed()) {
                 return false;  // a peer that goes on sending would never let it be waited for
             }
-            patienceEnds = now + Patience;
+            patienceEnds = Clock::now() + Patience;
             continue;
         }
         if (received < 0 && errno == EINTR) {
             continue;
         }
-        if (received == 0 || errno != EAGAIN || WaitToReceive(patienceEnds) == Readiness::Lost) {
+        if (received == 0 || errno != EAGAIN || !WaitToReceive(patienceEnds)) {
             return false;
         }
     }
     return true;
 }
 
-bool UsbIpSocket::LimitIsBefore(Clock::time_point time) {
-    const std::lock_guard lock(mutex_);
-    return limit_ && *limit_ < time;
+bool UsbIpSocket::LimitHasPassed() const {
+    pollfd state{limit_.Get(), POLLIN, 0};
+    return poll(&state, 1, 0) > 0;
 }
 
-UsbIpSocket::Readiness UsbIpSocket::WaitToReceive(std::optional<Clock::time_point> patienceEnds) {
+/// False when the patience or the limit ended before anything came.
+bool UsbIpSocket::WaitToReceive(std::optional<Clock::time_point> patienceEnds) const {
     for (;;) {
-        std::optional<Clock::time_point> end = patienceEnds;
-        {
-            const std::lock_guard lock(mutex_);
-            if (limit_ && (!end || *limit_ < *end)) {
-                end = limit_;
-            }
-        }
-        std::array<pollfd, 2> states{pollfd{file_, POLLIN, 0}, pollfd{wake_, POLLIN, 0}};
-        const int ready = poll(states.data(), states.size(), end ? MillisecondsUntil(*end) : -1);
+        std::array<pollfd, 2> states{pollfd{file_.Get(), POLLIN, 0}, pollfd{limit_.Get(), POLLIN, 0}};
+        const int timeout = patienceEnds ? MillisecondsUntil(*patienceEnds) : -1;
+        const int ready = poll(states.data(), states.size(), timeout);
         if (states[0].revents != 0) {
-            return Readiness::Ready;
+            return true;
         }
-        if (ready > 0) {
-            eventfd_t count = 0;
-            eventfd_read(wake_, &count);
-        } else if (end && Clock::now() >= *end) {
-            return Readiness::Lost;
+        if (states[1].revents != 0 || (ready == 0 && Clock::now() >= *patienceEnds)) {
+            return false;
         }
     }
 }

@@ -3,9 +3,10 @@
 #include <array>
 #include <chrono>
 #include <cstdint>
-#include <mutex>
 #include <optional>
 #include <span>
+
+#include "Platform/Linux/FileDescriptor.h"
 
 namespace Varnholt::Platform::Usb {
 
@@ -17,9 +18,6 @@ class UsbIpSocket final {
 
     /// Takes the file descriptor over.
     explicit UsbIpSocket(int socketFile);
-    ~UsbIpSocket();
-    UsbIpSocket(const UsbIpSocket&) = delete;
-    UsbIpSocket& operator=(const UsbIpSocket&) = delete;
 
     /// Sends both parts. False when the connection is lost or the peer does not take them in time. One thread
     /// at a time.
@@ -37,15 +35,11 @@ class UsbIpSocket final {
     void Shutdown();
 
   private:
-    enum class Readiness { Ready, Lost };
-    bool LimitIsBefore(Clock::time_point time);
-    Readiness WaitToReceive(std::optional<Clock::time_point> patienceEnds);
+    bool LimitHasPassed() const;
+    bool WaitToReceive(std::optional<Clock::time_point> patienceEnds) const;
 
-    const int file_;
-    const int wake_;  // readable when `limit` has changed
-
-    std::mutex mutex_;  // guards `limit`
-    std::optional<Clock::time_point> limit_;
+    const Linux::FileDescriptor file_;
+    const Linux::FileDescriptor limit_;  // a timer, readable once the limit has passed
 
     // Bytes received and not asked for yet; small messages then take one call of the system.
     std::array<std::uint8_t, 4096> buffer_{};
