@@ -1,10 +1,12 @@
 #include "Platform/Usb/UsbIpDevice.h"
 
 #include <algorithm>
+#include <array>
 #include <condition_variable>
 #include <exception>
 #include <mutex>
 #include <new>
+#include <span>
 #include <thread>
 #include <utility>
 
@@ -27,10 +29,8 @@ constexpr auto RequestPatience = std::chrono::milliseconds(2000);
 /// A transfer of the device's own, waited for.
 class WaitedTransfer final : public Transfer, private TransferClient {
   public:
-    WaitedTransfer(const SetupPacket& packet, std::vector<std::uint8_t>& buffer) {
-        setup = packet;
-        data = buffer.data();
-        length = static_cast<std::uint32_t>(buffer.size());
+    WaitedTransfer(const SetupPacket& packet, std::span<std::uint8_t> buffer) {
+        MakeControl(packet, buffer);
         client = this;
     }
 
@@ -101,8 +101,6 @@ class UsbIpDevice final : public UsbDevice {
 
     const UsbIpConnector connect_;
     const std::string busId_;
-
-    bool Claimed();
 
     std::mutex claimMutex_;  // taken first; held while what follows changes
     std::unique_ptr<UsbIpSocket> socket_;
@@ -252,8 +250,7 @@ void UsbIpDevice::Listen() {
     }
     for (const Running& each : left) {
         if (each.transfer) {
-            each.transfer->status = status;
-            each.transfer->client->TransferCompleted(*each.transfer);
+            Complete(*each.transfer, status, 0);
         }
     }
 }
@@ -311,47 +308,24 @@ void UsbIpDevice::Complete(Transfer& transfer, TransferStatus status, std::uint3
 }
 
 std::vector<EndpointInfo> UsbIpDevice::Endpoints(ErrorCode& error) {
+    const std::lock_guard claimLock(claimMutex_);
     error = Errors::Success;
-    {
-        const std::lock_guard claimLock(claimMutex_);
-        if (!endpoints_.empty()) {
-            return endpoints_;
-        }
-    }
-    // The descriptors come over the connection, which there is only during a claim.
-    const bool claimed = Claimed();
-    std::vector<EndpointInfo> found;
-    if (!claimed) {
-        error = Claim();
-    }
-    if (error == Errors::Success) {
-        constexpr SetupPacket getConfiguration{0x80, 6, 0x0200, 0, 255};
-        std::vector<std::uint8_t> bytes(getConfiguration.length);
+    if (endpoints_.empty()) {
+        constexpr SetupPacket getConfiguration{0x80, 6, 0x0200, 0};
+        std::array<std::uint8_t, 255> bytes{};
         WaitedTransfer transfer(getConfiguration, bytes);
         error = transfer.Do(*this);
         if (error == Errors::Success) {
-            bytes.resize(transfer.actualLength);
-            found = EndpointsOfFirstInterface(bytes);
-        }
-        if (!claimed) {
-            Release();
+            endpoints_ = EndpointsOfFirstInterface(std::span(bytes).first(transfer.actualLength));
         }
     }
-    const std::lock_guard claimLock(claimMutex_);
-    endpoints_ = found;
-    return found;
-}
-
-bool UsbIpDevice::Claimed() {
-    const std::lock_guard claimLock(claimMutex_);
-    return socket_ != nullptr;
+    return endpoints_;
 }
 
 ErrorCode UsbIpDevice::ClearHalt(std::uint8_t endpoint) {
     constexpr std::uint8_t toEndpoint = 0x02;
     constexpr std::uint8_t clearFeature = 1;
-    std::vector<std::uint8_t> nothing;
-    return WaitedTransfer({toEndpoint, clearFeature, 0, endpoint, 0}, nothing).Do(*this);
+    return WaitedTransfer({toEndpoint, clearFeature, 0, endpoint}, {}).Do(*this);
 }
 
 }  // namespace
