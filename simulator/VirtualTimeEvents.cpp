@@ -1,7 +1,7 @@
 #include <algorithm>
 
 #include "Platform/ErrorCodes.h"
-#include "Platform/Linux/SystemThread.h"
+#include "Platform/Linux/HostSignalsBlocked.h"
 #include "Platform/RealScheduler.h"
 #include "VirtualTime.h"
 
@@ -55,7 +55,10 @@ bool VirtualTime::CanHost(const ThreadRecord& thread) {
     }
     // Without the thread for events, one that needs a lock of its host is reported as a deadlock; nothing
     // worse.
-    hasEventThread_ = hasEventThread_ || StartSystemThread(systemEventThread_, RunEventThread, this);
+    if (!hasEventThread_) {
+        const HostSignalsBlocked blocked;
+        hasEventThread_ = pthread_create(&systemEventThread_, nullptr, RunEventThread, this) == 0;
+    }
     return !hasEventThread_;
 }
 

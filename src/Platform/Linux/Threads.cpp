@@ -5,7 +5,7 @@
 
 #include "Platform/CallFilter.h"
 #include "Platform/Linux/HandleTable.h"
-#include "Platform/Linux/SystemThread.h"
+#include "Platform/Linux/HostSignalsBlocked.h"
 #include "Platform/Linux/ThreadObject.h"
 
 namespace Varnholt::Platform {
@@ -60,7 +60,12 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
         CurrentClock().ThreadMade(hold, record);
     }
     object->MustBeJoined(true);
-    if (!StartSystemThread(object->thread, RunThread, start.get())) {
+    bool isRunning = false;
+    {
+        const HostSignalsBlocked blocked;
+        isRunning = pthread_create(&object->thread, nullptr, RunThread, start.get()) == 0;
+    }
+    if (!isRunning) {
         object->MustBeJoined(false);
         {
             DispatcherLock hold;
