@@ -44,13 +44,18 @@ bool OnObject(Handle handle, Action action) {
     return Succeeded(code);
 }
 
-/// Throws nothing, because destructors wait: a mutex that there is no memory to own is not acquired.
-WaitAnyResult WaitForObjects(std::span<WaitEntry> entries, std::uint32_t timeout) try {
+/// Signals the object first, if there is one. Throws nothing, because destructors wait: a mutex that there is
+/// no memory to own is not acquired.
+WaitAnyResult WaitForObjects(std::span<WaitEntry> entries, std::uint32_t timeout,
+                             WaitableObject* toSignal = nullptr) try {
     const Microseconds deadline = DeadlineAfter(timeout);
     WaitAnyResult outcome{};
     {
         DispatcherLock hold;
         CurrentClock().Preempt(hold);
+        if (toSignal && !Succeeded(toSignal->Signal(CurrentThread()))) {
+            return {WaitResult::Failed, 0};
+        }
         outcome = WaitForAny(hold, entries, deadline);
     }
     if (outcome.result == WaitResult::Signalled) {
@@ -148,23 +153,7 @@ WaitResult SignalAndWait(Handle toSignal, Handle toWait, std::uint32_t timeout) 
     }
     const ObjectRef signalled = HandleTable::Instance().Find(toSignal);
     std::array entries{WaitEntry{signalled ? HandleTable::Instance().Find(toWait) : nullptr}};
-    if (!entries[0].object) {
-        return WaitResult::Failed;
-    }
-    const Microseconds deadline = DeadlineAfter(timeout);
-    WaitResult result{};
-    {
-        DispatcherLock hold;
-        CurrentClock().Preempt(hold);
-        if (!Succeeded(signalled->Signal(CurrentThread()))) {
-            return WaitResult::Failed;
-        }
-        result = WaitForAny(hold, entries, deadline).result;
-    }
-    if (result == WaitResult::Signalled) {
-        entries[0].object->AfterWait();
-    }
-    return result;
+    return entries[0].object ? WaitForObjects(entries, timeout, signalled.get()).result : WaitResult::Failed;
 }
 
 struct EmbeddedEvent::Impl {
