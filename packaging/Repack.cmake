@@ -24,7 +24,12 @@ foreach(PACKAGE IN LISTS CPACK_PACKAGE_FILES)
     file(MAKE_DIRECTORY "${FOLDER}")
     execute_process(COMMAND tar -xzf "${PACKAGE}" -C "${FOLDER}" COMMAND_ERROR_IS_FATAL ANY)
     file(GLOB TOP RELATIVE "${FOLDER}" "${FOLDER}/*")
-    execute_process(COMMAND tar --sort=name --owner=root:0 --group=root:0 --use-compress-program "gzip -9n" -cf "${PACKAGE}" -C "${FOLDER}" ${TOP}
+    set(MODIFIED)
+    if(DEFINED ENV{SOURCE_DATE_EPOCH})
+      set(MODIFIED "--mtime=@$ENV{SOURCE_DATE_EPOCH}")  # CPack dates the outermost folder when it makes it
+    endif()
+    execute_process(COMMAND tar --sort=name --owner=root:0 --group=root:0 ${MODIFIED} --use-compress-program "gzip -9n"
+        -cf "${PACKAGE}" -C "${FOLDER}" ${TOP}
       COMMAND_ERROR_IS_FATAL ANY)
   elseif(PACKAGE MATCHES "\\.zip$")
     file(ARCHIVE_EXTRACT INPUT "${PACKAGE}" DESTINATION "${FOLDER}")
