@@ -8,6 +8,8 @@
 #include <utility>
 #include <vector>
 
+#include "Host.h"
+
 namespace Varnholt::Python {
 
 /// Memory of one size for arrays. What an array gives back serves again: memory that is new to a process is
@@ -39,7 +41,9 @@ class BlockPool final {
         auto loan = std::make_unique<Loan>(std::move(pool), std::move(memory));
         pybind11::capsule owner(loan.get(), [](void* pointer) {
             const std::unique_ptr<Loan> ended(static_cast<Loan*>(pointer));
-            ended->first->GiveBack(std::move(ended->second));
+            if (!Host::Instance().IsForked()) {  // a thread that the child lacks may have held the lock
+                ended->first->GiveBack(std::move(ended->second));
+            }
         });
         loan.release();
         return owner;
