@@ -10,7 +10,8 @@ namespace Varnholt::Platform::Linux {
 /// Owns a file descriptor and closes it, which leaves `errno` alone.
 class FileDescriptor final {
   public:
-    explicit FileDescriptor(int owned = -1) : number_(owned) {}
+    FileDescriptor() = default;
+    explicit FileDescriptor(int owned) : number_(owned) {}
     FileDescriptor(FileDescriptor&& other) noexcept : number_(other.Release()) {}
     FileDescriptor& operator=(FileDescriptor&& other) noexcept {
         std::swap(number_, other.number_);
@@ -30,7 +31,7 @@ class FileDescriptor final {
     int Release() { return std::exchange(number_, -1); }
 
   private:
-    int number_;
+    int number_ = -1;
 };
 
 }  // namespace Varnholt::Platform::Linux
