@@ -163,8 +163,7 @@ bool Commands::StartRead(std::span<const std::uint8_t> data) {
 
 std::size_t Commands::AnswerMode(std::span<std::uint8_t, LongestAnswer> answer) const {
     const MeasureMode& current = CurrentMode();
-    const auto count = static_cast<std::uint8_t>(HasModes() ? settings_.modes.size() : 1);
-    answer[0] = settings_.announcedModes ? settings_.announcedModes : count;
+    answer[0] = static_cast<std::uint8_t>(HasModes() ? settings_.modes.size() : 1);
     answer[1] = mode;
     answer[2] = 0;
     answer[3] = current.coarseFactor;

@@ -42,8 +42,6 @@ struct InstrumentSettings {
 
     /// Modes 1, 2, ... of the new firmware. The old one has the first only.
     std::vector<MeasureMode> modes{{130, 68, 1}, {130, 34, 0}, {100, 10, 0}};
-    /// The number of modes it claims to have; 0 tells the truth.
-    std::uint8_t announcedModes = 0;
 
     /// The EEPROM's content, 8192 bytes; empty: that of a fresh instrument.
     std::vector<std::uint8_t> eeprom{};
