@@ -1,4 +1,5 @@
 // One opening of the simulated instrument.
+#include "Descriptors.h"
 #include "SimulatedInstrument.h"
 
 namespace Varnholt::Simulator {
@@ -10,16 +11,17 @@ class SimulatedInstrument::Connection final : public Platform::Usb::UsbDevice {
     ~Connection() override { instrument_->Drop(attachment_); }
 
     std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override {
-        return instrument_->Endpoints(error);
+        error = Platform::Errors::Success;
+        return {Simulator::Endpoints.begin(), Simulator::Endpoints.end()};
     }
-    Platform::ErrorCode Claim() override { return instrument_->ClaimFor(attachment_); }
-    void Release() override { instrument_->ReleaseFor(attachment_); }
+    Platform::ErrorCode Claim() override { return instrument_->Claim(attachment_); }
+    void Release() override { instrument_->Release(attachment_); }
     Platform::ErrorCode Submit(Platform::Usb::Transfer& transfer) override {
-        return instrument_->SubmitFor(attachment_, transfer);
+        return instrument_->Submit(attachment_, transfer);
     }
     void Cancel(Platform::Usb::Transfer& transfer) override { instrument_->Cancel(transfer); }
     Platform::ErrorCode ClearHalt(std::uint8_t endpoint) override {
-        return instrument_->ClearHaltFor(attachment_, endpoint);
+        return instrument_->ClearHalt(attachment_, endpoint);
     }
 
   private:

@@ -36,9 +36,8 @@ SimulatedInstrument::SimulatedInstrument(Platform::EventScheduler& eventSchedule
     : settings_(std::move(instrumentSettings)),
       scheduler_(eventScheduler),
       timed_(settings_.bytesPerSecond != 0 || settings_.takesIntegrationTime),
-      ownAttachment_(),
       commands_(settings_),
-      dataAlarm_(scheduler_, [this] { DataDue(); }),
+      dataAlarm_(scheduler_, [this] { Do([](std::uint64_t, Completions&) {}); }),
       buttonAlarm_(scheduler_, [this] { PressButton(); }) {}
 
 SimulatedInstrument::~SimulatedInstrument() {
@@ -53,11 +52,6 @@ void SimulatedInstrument::WaitForClients() const {
     }
 }
 
-std::vector<Platform::Usb::EndpointInfo> SimulatedInstrument::Endpoints(ErrorCode& error) {
-    error = Errors::Success;
-    return {Simulator::Endpoints.begin(), Simulator::Endpoints.end()};
-}
-
 SimulatedInstrument::Endpoint* SimulatedInstrument::FindEndpoint(std::uint8_t address) {
     const auto found =
         std::ranges::find(Simulator::Endpoints, address, &Platform::Usb::EndpointInfo::address);
@@ -66,7 +60,7 @@ SimulatedInstrument::Endpoint* SimulatedInstrument::FindEndpoint(std::uint8_t ad
                : &endpoints_[static_cast<std::size_t>(found - Simulator::Endpoints.begin())];
 }
 
-ErrorCode SimulatedInstrument::ClaimFor(const Attachment& attachment) {
+ErrorCode SimulatedInstrument::Claim(const Attachment& attachment) {
     {
         const std::lock_guard lock(mutex_);
         if (!Attached(attachment)) {
@@ -85,7 +79,7 @@ ErrorCode SimulatedInstrument::ClaimFor(const Attachment& attachment) {
     return Errors::Success;
 }
 
-void SimulatedInstrument::ReleaseFor(const Attachment& attachment) {
+void SimulatedInstrument::Release(const Attachment& attachment) {
     {
         const std::lock_guard lock(mutex_);
         if (claimedBy_ != &attachment) {
@@ -96,30 +90,18 @@ void SimulatedInstrument::ReleaseFor(const Attachment& attachment) {
     buttonAlarm_.Clear();
 }
 
-ErrorCode SimulatedInstrument::SubmitFor(const Attachment& attachment, Transfer& transfer) try {
-    const std::uint64_t now = TimeIfItMatters();
+template <class Change>
+void SimulatedInstrument::Do(Change change) {
+    const std::uint64_t now = timed_ ? scheduler_.Now() * NanosecondsPerMicrosecond : 0;
     Completions done(completing_);
     std::uint64_t ringAt = Never;
     bool memoryChanged = false;
     {
         const std::lock_guard lock(mutex_);
-        if (!Attached(attachment)) {
-            return Errors::DeviceNotConnected;
-        }
-        if (transfer.endpoint == 0) {
-            Control(transfer, now, done);
-        } else {
-            Endpoint* const endpoint = FindEndpoint(transfer.endpoint);
-            if (!endpoint) {
-                return Errors::InvalidParameter;
-            }
-            if (endpoint->halted) {
-                done.Add(transfer, TransferStatus::Stalled, 0);
-            } else {
-                endpoint->queue.push_back({&transfer, &attachment, now});
-            }
-        }
-        Serve(now, done);
+        change(now, done);
+        ServeBulkOut(done);
+        ServeBulkIn(now, done);
+        ServeInterrupt(done);
         ringAt = nextDataAt_;
         memoryChanged = std::exchange(eepromChanged_, false);
     }
@@ -130,40 +112,45 @@ ErrorCode SimulatedInstrument::SubmitFor(const Attachment& attachment, Transfer&
         dataAlarm_.RingNoLaterThan(InMicroseconds(ringAt));
     }
     done.Deliver();
-    return Errors::Success;
+}
+
+ErrorCode SimulatedInstrument::Submit(const Attachment& attachment, Transfer& transfer) try {
+    ErrorCode code = Errors::Success;
+    Do([&](std::uint64_t now, Completions& done) {
+        Endpoint* const endpoint = FindEndpoint(transfer.endpoint);
+        if (!Attached(attachment)) {
+            code = Errors::DeviceNotConnected;
+        } else if (transfer.endpoint == 0) {
+            Control(transfer, now, done);
+        } else if (!endpoint) {
+            code = Errors::InvalidParameter;
+        } else if (endpoint->halted) {
+            done.Add(transfer, TransferStatus::Stalled, 0);
+        } else {
+            endpoint->queue.push_back({&transfer, &attachment, now});
+        }
+    });
+    return code;
 } catch (const std::bad_alloc&) {
     return Errors::NotEnoughMemory;
 }
 
 void SimulatedInstrument::Cancel(Transfer& transfer) {
-    const std::uint64_t now = TimeIfItMatters();
-    Completions done(completing_);
-    std::uint64_t ringAt = Never;
-    {
-        const std::lock_guard lock(mutex_);
+    Do([&](std::uint64_t now, Completions& done) {
         for (Endpoint& endpoint : endpoints_) {
             const auto pending = std::ranges::find(endpoint.queue, &transfer, &Pending::transfer);
             if (pending == endpoint.queue.end()) {
                 continue;
             }
-            std::uint32_t moved = 0;
-            if (&endpoint == &endpoints_[BulkIn] && pending == endpoint.queue.begin()) {
-                moved = TakeWhatMoved(*pending, now);
-            }
+            const bool moves = &endpoint == &endpoints_[BulkIn] && pending == endpoint.queue.begin();
+            const std::uint32_t moved = moves ? TakeWhatMoved(*pending, now) : 0;
             endpoint.queue.erase(pending);
             done.Add(transfer, TransferStatus::Cancelled, moved);
-            break;
         }
-        Serve(now, done);
-        ringAt = nextDataAt_;
-    }
-    if (ringAt != Never) {
-        dataAlarm_.RingNoLaterThan(InMicroseconds(ringAt));
-    }
-    done.Deliver();
+    });
 }
 
-ErrorCode SimulatedInstrument::ClearHaltFor(const Attachment& attachment, std::uint8_t address) {
+ErrorCode SimulatedInstrument::ClearHalt(const Attachment& attachment, std::uint8_t address) {
     const std::lock_guard lock(mutex_);
     if (!Attached(attachment)) {
         return Errors::DeviceNotConnected;
@@ -177,10 +164,8 @@ ErrorCode SimulatedInstrument::ClearHaltFor(const Attachment& attachment, std::u
 }
 
 void SimulatedInstrument::Drop(const Attachment& attachment) {
-    ReleaseFor(attachment);
-    Completions done(completing_);
-    {
-        const std::lock_guard lock(mutex_);
+    Release(attachment);
+    Do([&](std::uint64_t, Completions& done) {
         for (Endpoint& endpoint : endpoints_) {
             std::erase_if(endpoint.queue, [&](const Pending& pending) {
                 if (pending.owner == &attachment) {
@@ -189,16 +174,13 @@ void SimulatedInstrument::Drop(const Attachment& attachment) {
                 return pending.owner == &attachment;
             });
         }
-    }
-    done.Deliver();
+    });
     WaitForClients();
 }
 
 void SimulatedInstrument::Unplug() {
     buttonAlarm_.Clear();
-    Completions done(completing_);
-    {
-        const std::lock_guard lock(mutex_);
+    Do([this](std::uint64_t, Completions& done) {
         pluggedIn_ = false;
         claimedBy_ = nullptr;
         configuration_ = 0;
@@ -206,13 +188,9 @@ void SimulatedInstrument::Unplug() {
         commands_.PowerOff();
         for (Endpoint& endpoint : endpoints_) {
             endpoint.halted = false;
-            for (const Pending& pending : endpoint.queue) {
-                done.Add(*pending.transfer, TransferStatus::DeviceGone, 0);
-            }
-            endpoint.queue.clear();
+            EndAll(endpoint, TransferStatus::DeviceGone, done);
         }
-    }
-    done.Deliver();
+    });
 }
 
 void SimulatedInstrument::PlugIn() {
@@ -243,57 +221,19 @@ std::size_t SimulatedInstrument::PendingTransfers() const {
 }
 
 void SimulatedInstrument::PressButton() {
-    Completions done(completing_);
-    {
-        const std::lock_guard lock(mutex_);
-        buttonReportWaits_ = pluggedIn_;
-        ServeInterrupt(done);
-    }
-    done.Deliver();
+    Do([this](std::uint64_t, Completions&) { buttonReportWaits_ = pluggedIn_; });
 }
 
-void SimulatedInstrument::HaltEndpoint(std::uint8_t address) {
-    Completions done(completing_);
-    {
-        const std::lock_guard lock(mutex_);
-        if (Endpoint* const endpoint = FindEndpoint(address)) {
-            Halt(*endpoint, done);
-        }
-    }
-    done.Deliver();
-}
-
-void SimulatedInstrument::DataDue() {
-    const std::uint64_t now = TimeIfItMatters();
-    Completions done(completing_);
-    std::uint64_t ringAt = Never;
-    {
-        const std::lock_guard lock(mutex_);
-        Serve(now, done);
-        ringAt = nextDataAt_;
-    }
-    if (ringAt != Never) {
-        dataAlarm_.RingNoLaterThan(InMicroseconds(ringAt));
-    }
-    done.Deliver();
-}
-
-std::uint64_t SimulatedInstrument::TimeIfItMatters() {
-    return timed_ ? scheduler_.Now() * NanosecondsPerMicrosecond : 0;
-}
-
-void SimulatedInstrument::Halt(Endpoint& endpoint, Completions& done) {
-    endpoint.halted = true;
+void SimulatedInstrument::EndAll(Endpoint& endpoint, TransferStatus status, Completions& done) {
     for (const Pending& pending : endpoint.queue) {
-        done.Add(*pending.transfer, TransferStatus::Stalled, 0);
+        done.Add(*pending.transfer, status, 0);
     }
     endpoint.queue.clear();
 }
 
-void SimulatedInstrument::Serve(std::uint64_t now, Completions& done) {
-    ServeBulkOut(done);
-    ServeBulkIn(now, done);
-    ServeInterrupt(done);
+void SimulatedInstrument::Halt(Endpoint& endpoint, Completions& done) {
+    endpoint.halted = true;
+    EndAll(endpoint, TransferStatus::Stalled, done);
 }
 
 void SimulatedInstrument::ServeBulkOut(Completions& done) {

@@ -19,32 +19,19 @@ class Completions;
 
 /// The instrument as a USB device. What it has no data for stays pending (the device says NAK) until data
 /// come or it is cancelled; what it does not know stalls. It answers the standard requests, so that an
-/// operating system can attach it.
-///
-/// It can be used as a device itself, or through any number of connections as a bus hands them out.
-class SimulatedInstrument final : public Platform::Usb::UsbDevice {
+/// operating system can attach it. It is reached through any number of connections, as a bus hands them out.
+class SimulatedInstrument final {
   public:
     /// `eventScheduler` must outlive the instrument.
     explicit SimulatedInstrument(Platform::EventScheduler& eventScheduler,
                                  InstrumentSettings instrumentSettings = {});
-    ~SimulatedInstrument() override;
+    ~SimulatedInstrument();
     SimulatedInstrument(const SimulatedInstrument&) = delete;
     SimulatedInstrument& operator=(const SimulatedInstrument&) = delete;
 
-    std::vector<Platform::Usb::EndpointInfo> Endpoints(Platform::ErrorCode& error) override;
-    /// Exclusive: `Errors::Busy` while it is claimed, also by the same caller.
-    Platform::ErrorCode Claim() override { return ClaimFor(ownAttachment_); }
-    void Release() override { ReleaseFor(ownAttachment_); }
-    Platform::ErrorCode Submit(Platform::Usb::Transfer& transfer) override {
-        return SubmitFor(ownAttachment_, transfer);
-    }
-    void Cancel(Platform::Usb::Transfer& transfer) override;
-    Platform::ErrorCode ClearHalt(std::uint8_t endpoint) override {
-        return ClearHaltFor(ownAttachment_, endpoint);
-    }
-
     /// The instrument as seen through one opening of it: a connection that was made before the instrument was
-    /// unplugged stays without a device. Ends its transfers and its claim with its life.
+    /// unplugged stays without a device. A claim is exclusive: `Errors::Busy` while there is one, also the
+    /// connection's own. Claim and transfers end with the connection's life.
     static std::shared_ptr<Platform::Usb::UsbDevice> Connect(std::shared_ptr<SimulatedInstrument> instrument);
 
     /// Everything under way ends with `DeviceGone`; what is not in a lasting memory is lost.
@@ -54,7 +41,6 @@ class SimulatedInstrument final : public Platform::Usb::UsbDevice {
 
     /// One interrupt report; it waits in the instrument until the host fetches it.
     void PressButton();
-    void HaltEndpoint(std::uint8_t endpoint);
 
     /// Looks into the instrument, or changes it, while nothing else does: `look` is called with its commands.
     template <class Function>
@@ -67,7 +53,6 @@ class SimulatedInstrument final : public Platform::Usb::UsbDevice {
     /// Transfers that it has accepted and not completed.
     std::size_t PendingTransfers() const;
     bool Claimed() const;
-    const InstrumentSettings& Settings() const { return settings_; }
 
   private:
     class Connection;
@@ -89,28 +74,31 @@ class SimulatedInstrument final : public Platform::Usb::UsbDevice {
     static constexpr std::uint64_t Never = ~std::uint64_t{0};
 
     std::uint64_t Plugging() const;
-    Platform::ErrorCode ClaimFor(const Attachment& attachment);
-    void ReleaseFor(const Attachment& attachment);
-    Platform::ErrorCode SubmitFor(const Attachment& attachment, Platform::Usb::Transfer& transfer);
-    Platform::ErrorCode ClearHaltFor(const Attachment& attachment, std::uint8_t endpoint);
+    Platform::ErrorCode Claim(const Attachment& attachment);
+    void Release(const Attachment& attachment);
+    Platform::ErrorCode Submit(const Attachment& attachment, Platform::Usb::Transfer& transfer);
+    void Cancel(Platform::Usb::Transfer& transfer);
+    Platform::ErrorCode ClearHalt(const Attachment& attachment, std::uint8_t endpoint);
     void Drop(const Attachment& attachment);
     void WaitForClients() const;
-    void DataDue();
-    /// Nanoseconds of the scheduler's clock; 0 when no transfer takes time.
-    std::uint64_t TimeIfItMatters();
+    /// Calls `change` with the lock held, completes what can be completed then, and tells those concerned
+    /// once the lock is free. It gets the time (nanoseconds of the scheduler's clock; 0 when no transfer
+    /// takes time) and the completions.
+    template <class Change>
+    void Do(Change change);
 
     // Called with the lock held.
     bool Attached(const Attachment& attachment) const {
-        return pluggedIn_ && (&attachment == &ownAttachment_ || attachment.plugging == plugging_);
+        return pluggedIn_ && attachment.plugging == plugging_;
     }
     Endpoint* FindEndpoint(std::uint8_t address);
     void Control(Platform::Usb::Transfer& transfer, std::uint64_t now, Completions& done);
     bool StandardOut(const Platform::Usb::SetupPacket& setup, Completions& done);
     std::vector<std::uint8_t> StandardIn(const Platform::Usb::SetupPacket& setup);
-    void Halt(Endpoint& endpoint, Completions& done);
-    /// Completes what can be completed now and says in `nextDataAt` when it is worth looking again.
-    void Serve(std::uint64_t now, Completions& done);
+    static void EndAll(Endpoint& endpoint, Platform::Usb::TransferStatus status, Completions& done);
+    static void Halt(Endpoint& endpoint, Completions& done);
     void ServeBulkOut(Completions& done);
+    /// Says in `nextDataAt_` when it is worth looking again.
     void ServeBulkIn(std::uint64_t now, Completions& done);
     void ServeInterrupt(Completions& done);
     std::uint64_t Duration(std::uint64_t bytes) const;
@@ -121,7 +109,6 @@ class SimulatedInstrument final : public Platform::Usb::UsbDevice {
     const InstrumentSettings settings_;
     Platform::EventScheduler& scheduler_;
     const bool timed_;  // transfers take time
-    const Attachment ownAttachment_;
 
     mutable std::mutex mutex_;  // guards what follows; not held while a client or the scheduler is called
     Commands commands_;

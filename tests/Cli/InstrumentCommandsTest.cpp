@@ -272,13 +272,15 @@ TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
 }
 
 TEST_P(InstrumentCommandsTest, ChipsTellInstrumentsApart) {
-    auto& left = host_.Add("left");
+    host_.Add("left");
     host_.Add("right", {.chipId = {1, 2, 3, 4, 5, 6, 7, 8}});
     Succeed("list --chip-id");
     EXPECT_THAT(tool_.Lines()[2], testing::AllOf(HasSubstr("right"), HasSubstr("0102030405060708")));
     EXPECT_EQ(JsonOf("identify --device chip:5A0123456789ABCD --json")["name"], "left");
 
-    ASSERT_EQ(left.Claim(), Platform::Errors::Success);
+    Platform::ErrorCode error = Platform::Errors::Success;
+    auto other = host_.Bus().Open("left", error);
+    ASSERT_EQ(other->Claim(), Platform::Errors::Success);
     const auto instruments = JsonOf("list --chip-id --json")["instruments"];
     EXPECT_EQ(instruments[0]["chipId"], nullptr);
     EXPECT_THAT(instruments[0]["problem"].get<std::string>(), HasSubstr("used by another process"));
@@ -286,7 +288,7 @@ TEST_P(InstrumentCommandsTest, ChipsTellInstrumentsApart) {
     EXPECT_EQ(JsonOf("identify -d chip:0102030405060708 --json")["name"], "right");
     Fail("identify -d chip:5a0123456789abcd", ExitCode::NotAvailable,
          Identifier("left") + ": the instrument is used");
-    left.Release();
+    other.reset();
     Fail("identify -d chip:5a0123456789abce", ExitCode::NoInstrument, "chip:5a0123456789abce");
     host_.Bus().SetFaults("left", Simulator::FaultPlan::Parse("control 0+:stall"));
     Fail("list --chip-id --json", ExitCode::InputOutput, Identifier("left"));

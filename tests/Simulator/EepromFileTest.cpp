@@ -32,11 +32,13 @@ class EepromFileTest : public testing::Test {
         file.Keep(instrument);
         return instrument;
     }
-    static void WriteByte(SimulatedInstrument& instrument, std::uint8_t address, std::uint8_t value) {
+    static void WriteByte(const std::shared_ptr<SimulatedInstrument>& instrument, std::uint8_t address,
+                          std::uint8_t value) {
+        const auto device = SimulatedInstrument::Connect(instrument);
         TestTransfer request = TestTransfer::Memory(Request::WriteEeprom, address, 1);
         TestTransfer data = TestTransfer::Out(Protocol::BulkOutEndpoint, {value});
-        instrument.Submit(request);
-        instrument.Submit(data);
+        device->Submit(request);
+        device->Submit(data);
     }
 
     const Tests::TestFolder folder_;
@@ -52,11 +54,11 @@ TEST_F(EepromFileTest, MemoryIsThereAgainAfterARestart) {
         EepromFile file(loop_, fileName_, log_);
         const auto instrument = MakeInstrument(file);
         EXPECT_EQ(expected, ReadEepromFile(fileName_)) << "it exists from the start";
-        WriteByte(*instrument, 8, expected[8] = 43);
+        WriteByte(instrument, 8, expected[8] = 43);
         loop_.CallAt(loop_.Now() + 300'000, [this] { loop_.Stop(); });
         loop_.Run();
         EXPECT_EQ(expected, ReadEepromFile(fileName_)) << "and is written while the program runs";
-        WriteByte(*instrument, 9, expected[9] = 44);
+        WriteByte(instrument, 9, expected[9] = 44);
         EXPECT_TRUE(file.Finish());
     }
     EepromFile file(loop_, fileName_, log_);

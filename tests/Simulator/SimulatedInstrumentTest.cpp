@@ -20,7 +20,7 @@ class SimulatedInstrumentTest : public testing::Test {
   protected:
     /// Submits a transfer that must be done at once and answers its data.
     Bytes Do(TestTransfer&& transfer, TransferStatus status = TransferStatus::Completed) {
-        EXPECT_EQ(Errors::Success, instrument_.Submit(transfer));
+        EXPECT_EQ(Errors::Success, device_->Submit(transfer));
         EXPECT_EQ(1, transfer.completions);
         EXPECT_EQ(status, transfer.status);
         return transfer.Data();
@@ -32,17 +32,19 @@ class SimulatedInstrumentTest : public testing::Test {
     /// A transfer gets nothing, and ends once with its cancellation.
     void ExpectSilent(std::uint8_t endpoint) {
         TestTransfer transfer = TestTransfer::In(endpoint, 2);
-        instrument_.Submit(transfer);
+        device_->Submit(transfer);
         EXPECT_EQ(0, transfer.completions);
-        EXPECT_EQ(1U, instrument_.PendingTransfers());
-        instrument_.Cancel(transfer);
-        instrument_.Cancel(transfer);
+        EXPECT_EQ(1U, instrument_->PendingTransfers());
+        device_->Cancel(transfer);
+        device_->Cancel(transfer);
         EXPECT_EQ(1, transfer.completions);
         EXPECT_EQ(TransferStatus::Cancelled, transfer.status);
     }
 
     ManualScheduler scheduler_;
-    SimulatedInstrument instrument_{scheduler_};
+    const std::shared_ptr<SimulatedInstrument> instrument_ =
+        std::make_shared<SimulatedInstrument>(scheduler_);
+    const std::shared_ptr<UsbDevice> device_ = SimulatedInstrument::Connect(instrument_);
 };
 
 TEST_F(SimulatedInstrumentTest, RefusesWhatItCannotDo) {
@@ -73,7 +75,7 @@ TEST_F(SimulatedInstrumentTest, RefusesWhatItCannotDo) {
 
 TEST_F(SimulatedInstrumentTest, AnswersComeOnceAndGoWithTheNextRequest) {
     TestTransfer early = TestTransfer::In(BulkInEndpoint, 256);
-    instrument_.Submit(early);
+    device_->Submit(early);
     EXPECT_EQ(0, early.completions) << "nothing was asked for yet";
     Do(TestTransfer::Vendor(Request::Measure));
     EXPECT_EQ(256U, early.Data().size());
@@ -83,7 +85,7 @@ TEST_F(SimulatedInstrumentTest, AnswersComeOnceAndGoWithTheNextRequest) {
 
     Do(TestTransfer::Vendor(Request::Measure));
     Do(TestTransfer::In(BulkInEndpoint, 100));
-    const Bytes memory = instrument_.Eeprom();
+    const Bytes memory = instrument_->Eeprom();
     EXPECT_EQ(Bytes(memory.begin(), memory.begin() + 64), ReadEeprom(0, 64));
     ExpectSilent(BulkInEndpoint);  // memory of a length that the host named has no end mark
 
@@ -100,15 +102,15 @@ TEST_F(SimulatedInstrumentTest, HaltedEndpointStallsUntilCleared) {
             return Do(TestTransfer::Control({0x82, 0, 0, BulkInEndpoint, 2}, Bytes(2)));
         };
         TestTransfer pending = TestTransfer::In(BulkInEndpoint, 64);
-        instrument_.Submit(pending);
-        instrument_.HaltEndpoint(BulkInEndpoint);
+        device_->Submit(pending);
+        Do(TestTransfer::Control({0x02, 3, 0, BulkInEndpoint, 0}, {}));
         EXPECT_EQ(TransferStatus::Stalled, pending.status);
         Do(TestTransfer::In(BulkInEndpoint, 64), TransferStatus::Stalled);
         EXPECT_EQ(halted(), (Bytes{1, 0}));
         if (byRequest) {
             Do(TestTransfer::Control({0x02, 1, 0, BulkInEndpoint, 0}, {}));
         } else {
-            EXPECT_EQ(Errors::Success, instrument_.ClearHalt(BulkInEndpoint));
+            EXPECT_EQ(Errors::Success, device_->ClearHalt(BulkInEndpoint));
         }
         EXPECT_EQ(halted(), Bytes(2));
         EXPECT_EQ(64U, ReadEeprom(0, 64).size());
@@ -135,14 +137,14 @@ TEST_F(SimulatedInstrumentTest, UnplugLosesWhatIsVolatile) {
     Do(TestTransfer::Vendor(Request::SetMeasureParameters, Bytes(8, 9)));
     Do(TestTransfer::Memory(Request::WriteEeprom, 100, 1));
     Do(TestTransfer::Out(BulkOutEndpoint, {42}));
-    instrument_.Unplug();
+    instrument_->Unplug();
     TestTransfer after = TestTransfer::In(BulkInEndpoint, 64);
-    EXPECT_EQ(Errors::DeviceNotConnected, instrument_.Submit(after));
-    EXPECT_EQ(Errors::DeviceNotConnected, instrument_.Claim());
+    EXPECT_EQ(Errors::DeviceNotConnected, device_->Submit(after));
+    EXPECT_EQ(Errors::DeviceNotConnected, device_->Claim());
     EXPECT_EQ(0, after.completions);
-    instrument_.PlugIn();
-    EXPECT_EQ(Errors::Success, instrument_.Claim());
-    instrument_.WithCommands([](const Commands& state) {
+    instrument_->PlugIn();
+    EXPECT_EQ(Errors::Success, SimulatedInstrument::Connect(instrument_)->Claim());
+    instrument_->WithCommands([](const Commands& state) {
         EXPECT_EQ(MeasureParameters(), state.parameters);
         EXPECT_EQ(42, state.eeprom[100]);
     });
