@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <array>
-#include <map>
 #include <utility>
 
 #include "Capture/DescribeRequest.h"
@@ -50,6 +49,11 @@ std::string RecordedTransfer::Text(std::size_t most) const {
     return status == TransferStatus::Completed ? text : text + " " + ToText(status);
 }
 
+/// A transfer on its way, and where it is written down: that outlives a `Clear` meanwhile.
+struct TransferRecorder::Running : Capture::InterceptedTransfer {
+    std::shared_ptr<RecordedTransfer> record = std::make_shared<RecordedTransfer>();
+};
+
 class TransferRecorder::Device final : public InterceptingDevice {
   public:
     Device(std::shared_ptr<UsbDevice> recorded, TransferRecorder& transferRecorder)
@@ -57,32 +61,24 @@ class TransferRecorder::Device final : public InterceptingDevice {
     ~Device() override { Detach(); }
 
   private:
-    /// Where a running transfer is written down.
-    struct Place {
-        std::size_t cleared;
-        std::size_t index;
-    };
+    CopyPointer NewCopy() override { return std::make_shared<Running>(); }
 
     Platform::ErrorCode Start(const CopyPointer& copy) override {
-        RecordedTransfer recorded;
-        recorded.endpoint = copy->endpoint;
-        recorded.setup = copy->setup;
-        recorded.length = copy->length;
+        RecordedTransfer& record = *static_cast<Running&>(*copy).record;
+        record.endpoint = copy->endpoint;
+        record.setup = copy->setup;
+        record.length = copy->length;
         if (!copy->IsIn()) {
-            recorded.data.assign(copy->data, copy->data + copy->length);
+            record.data.assign(copy->data, copy->data + copy->length);
         }
         {
             const std::lock_guard lock(recorder_.mutex_);
-            places_[copy->id] = {recorder_.cleared_, recorder_.transfers_.size()};
-            recorder_.transfers_.push_back(std::move(recorded));
+            recorder_.transfers_.push_back(static_cast<Running&>(*copy).record);
         }
         const Platform::ErrorCode code = PassOn(copy);
         if (code != Platform::Errors::Success) {
             const std::lock_guard lock(recorder_.mutex_);
-            if (RecordedTransfer* const refused = Find(copy->id)) {
-                refused->accepted = false;
-            }
-            places_.erase(copy->id);
+            record.accepted = false;
         }
         return code;
     }
@@ -90,27 +86,19 @@ class TransferRecorder::Device final : public InterceptingDevice {
     void Completed(Capture::InterceptedTransfer& copy) noexcept override {
         {
             const std::lock_guard lock(recorder_.mutex_);
-            if (RecordedTransfer* const recorded = Find(copy.id)) {
-                recorded->completed = true;
-                recorded->status = copy.status;
-                if (copy.IsIn()) {
-                    recorded->data.assign(copy.data, copy.data + copy.actualLength);
-                } else {
-                    recorded->data.resize(std::min<std::size_t>(recorded->data.size(), copy.actualLength));
-                }
+            RecordedTransfer& record = *static_cast<Running&>(copy).record;
+            record.completed = true;
+            record.status = copy.status;
+            if (copy.IsIn()) {
+                record.data.assign(copy.data, copy.data + copy.actualLength);
+            } else {
+                record.data.resize(std::min<std::size_t>(record.data.size(), copy.actualLength));
             }
-            places_.erase(copy.id);
         }
         InterceptingDevice::Completed(copy);
     }
 
-    RecordedTransfer* Find(std::uint64_t id) {
-        const Place place = places_.at(id);
-        return place.cleared == recorder_.cleared_ ? &recorder_.transfers_[place.index] : nullptr;
-    }
-
     TransferRecorder& recorder_;
-    std::map<std::uint64_t, Place> places_;  // guarded by the recorder's lock
 };
 
 std::shared_ptr<UsbDevice> TransferRecorder::Record(std::shared_ptr<UsbDevice> device) {
@@ -128,8 +116,12 @@ std::string TransferRecorder::Text(std::size_t most) const {
 }
 
 std::vector<RecordedTransfer> TransferRecorder::Transfers() const {
+    std::vector<RecordedTransfer> transfers;
     const std::lock_guard lock(mutex_);
-    return transfers_;
+    for (const auto& transfer : transfers_) {
+        transfers.push_back(*transfer);
+    }
+    return transfers;
 }
 
 std::size_t TransferRecorder::Count() const {
@@ -140,7 +132,6 @@ std::size_t TransferRecorder::Count() const {
 void TransferRecorder::Clear() {
     const std::lock_guard lock(mutex_);
     transfers_.clear();
-    ++cleared_;
 }
 
 }  // namespace Varnholt::Simulator

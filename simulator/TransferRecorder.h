@@ -40,11 +40,11 @@ class TransferRecorder final {
     void Clear();
 
   private:
+    struct Running;
     class Device;
 
-    mutable std::mutex mutex_;  // guards what follows
-    std::vector<RecordedTransfer> transfers_;
-    std::size_t cleared_ = 0;  // changes when earlier places are no longer valid
+    mutable std::mutex mutex_;  // guards what follows, and what the records say
+    std::vector<std::shared_ptr<RecordedTransfer>> transfers_;
 };
 
 std::string ToText(Platform::Usb::TransferStatus status);
