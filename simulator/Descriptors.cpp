@@ -18,91 +18,60 @@ enum Type : std::uint8_t {
 enum Text : std::uint8_t { Languages = 0, Manufacturer = 1, Product = 2, Serial = 3 };
 constexpr std::uint16_t EnglishUnitedStates = 0x0409;
 
-class DescriptorWriter final {
-  public:
-    explicit DescriptorWriter(Type type) { Begin(type); }
+using Bytes = std::vector<std::uint8_t>;
 
-    DescriptorWriter& Begin(Type type) {
-        EndCurrent();
-        start_ = bytes_.size();
-        return Byte(0).Byte(type);
-    }
-    DescriptorWriter& Byte(std::uint8_t value) {
-        bytes_.push_back(value);
-        return *this;
-    }
-    DescriptorWriter& Word(std::uint16_t value) {
-        return Byte(static_cast<std::uint8_t>(value)).Byte(static_cast<std::uint8_t>(value >> 8));
-    }
-    std::vector<std::uint8_t> Finish() {
-        EndCurrent();
-        return bytes_;
-    }
-
-  private:
-    void EndCurrent() {
-        if (!bytes_.empty()) {
-            bytes_[start_] = static_cast<std::uint8_t>(bytes_.size() - start_);
-        }
-    }
-
-    std::vector<std::uint8_t> bytes_;
-    std::size_t start_ = 0;
-};
-
-std::vector<std::uint8_t> DeviceDescriptor() {
-    constexpr std::uint16_t usbVersion = 0x0200;
-    constexpr std::uint8_t controlPacketSize = 64;
-    return DescriptorWriter(DeviceType)
-        .Word(usbVersion)
-        .Byte(VendorClass)
-        .Byte(0)
-        .Byte(0)
-        .Byte(controlPacketSize)
-        .Word(VendorId)
-        .Word(ProductId)
-        .Word(DeviceVersion)
-        .Byte(Manufacturer)
-        .Byte(Product)
-        .Byte(Serial)
-        .Byte(1)
-        .Finish();
+constexpr std::uint8_t Low(std::uint16_t word) {
+    return static_cast<std::uint8_t>(word);
+}
+constexpr std::uint8_t High(std::uint16_t word) {
+    return static_cast<std::uint8_t>(word >> 8);
 }
 
-std::vector<std::uint8_t> ConfigurationDescriptor() {
+/// A descriptor with its length in front.
+Bytes WithLength(Type type, const Bytes& content) {
+    Bytes descriptor{static_cast<std::uint8_t>(content.size() + 2), type};
+    descriptor.insert(descriptor.end(), content.begin(), content.end());
+    return descriptor;
+}
+
+Bytes DeviceDescriptor() {
+    constexpr std::uint16_t usbVersion = 0x0200;
+    constexpr std::uint8_t controlPacketSize = 64;
+    constexpr std::uint8_t configurations = 1;
+    return WithLength(
+        DeviceType, {Low(usbVersion), High(usbVersion), VendorClass, 0, 0, controlPacketSize, Low(VendorId),
+                     High(VendorId), Low(ProductId), High(ProductId), Low(DeviceVersion), High(DeviceVersion),
+                     Manufacturer, Product, Serial, configurations});
+}
+
+Bytes ConfigurationDescriptor() {
     constexpr std::uint8_t selfPowered = 0xC0;
     constexpr std::uint8_t halfOfMilliamperes = 50;
     constexpr std::uint8_t interruptInterval = 4;
-    DescriptorWriter writer(ConfigurationType);
-    writer.Word(0).Byte(1).Byte(ConfigurationValue).Byte(0).Byte(selfPowered).Byte(halfOfMilliamperes);
-    writer.Begin(InterfaceType)
-        .Byte(0)
-        .Byte(0)
-        .Byte(Endpoints.size())
-        .Byte(VendorClass)
-        .Byte(0)
-        .Byte(0)
-        .Byte(0);
+    Bytes bytes =
+        WithLength(ConfigurationType, {0, 0, 1, ConfigurationValue, 0, selfPowered, halfOfMilliamperes});
+    const auto append = [&bytes](const Bytes& descriptor) {
+        bytes.insert(bytes.end(), descriptor.begin(), descriptor.end());
+    };
+    append(WithLength(InterfaceType, {0, 0, Endpoints.size(), VendorClass, 0, 0, 0}));
     for (const auto& endpoint : Endpoints) {
-        writer.Begin(EndpointType)
-            .Byte(endpoint.address)
-            .Byte(endpoint.attributes)
-            .Word(endpoint.maximumPacketSize)
-            .Byte(endpoint.address == Protocol::InterruptInEndpoint ? interruptInterval : 0);
+        const bool isInterrupt = endpoint.address == Protocol::InterruptInEndpoint;
+        append(WithLength(EndpointType, {endpoint.address, endpoint.attributes,
+                                         Low(endpoint.maximumPacketSize), High(endpoint.maximumPacketSize),
+                                         isInterrupt ? interruptInterval : std::uint8_t{0}}));
     }
-    std::vector<std::uint8_t> bytes = writer.Finish();
     constexpr std::size_t totalLength = 2;
     Protocol::StoreLittle16(&bytes[totalLength], static_cast<std::uint16_t>(bytes.size()));
     return bytes;
 }
 
-std::vector<std::uint8_t> StringDescriptor(std::string_view text) {
+Bytes StringDescriptor(std::string_view text) {
     constexpr std::size_t longest = 126;
-    DescriptorWriter writer(StringType);
+    Bytes letters;
     for (const char letter : text.substr(0, longest)) {
-        writer.Word(static_cast<std::uint8_t>(letter));
+        letters.insert(letters.end(), {static_cast<std::uint8_t>(letter), 0});
     }
-    return writer.Finish();
+    return WithLength(StringType, letters);
 }
 
 }  // namespace
@@ -115,18 +84,19 @@ std::vector<std::uint8_t> Descriptor(std::uint16_t typeAndIndex, const std::stri
         case ConfigurationType:
             return index == 0 ? ConfigurationDescriptor() : std::vector<std::uint8_t>();
         case StringType:
-            switch (index) {
-                case Languages:
-                    return DescriptorWriter(StringType).Word(EnglishUnitedStates).Finish();
-                case Manufacturer:
-                    return StringDescriptor("Varnholt");
-                case Product:
-                    return StringDescriptor("Ostra, simulated");
-                case Serial:
-                    return StringDescriptor(serial);
-                default:
-                    return {};
-            }
+            break;
+        default:
+            return {};
+    }
+    switch (index) {
+        case Languages:
+            return WithLength(StringType, {Low(EnglishUnitedStates), High(EnglishUnitedStates)});
+        case Manufacturer:
+            return StringDescriptor("Varnholt");
+        case Product:
+            return StringDescriptor("Ostra, simulated");
+        case Serial:
+            return StringDescriptor(serial);
         default:
             return {};
     }
