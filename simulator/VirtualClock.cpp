@@ -6,22 +6,16 @@
 
 namespace Varnholt::Simulator {
 
-class VirtualClock::Impl final {
-  public:
-    explicit Impl(std::uint64_t seed) : time(seed) {}
-    VirtualTime time;
-};
-
-VirtualClock::VirtualClock(std::uint64_t seed) : impl_(std::make_unique<Impl>(seed)) {}
+VirtualClock::VirtualClock(std::uint64_t seed) : time_(std::make_unique<VirtualTime>(seed)) {}
 
 VirtualClock::~VirtualClock() = default;
 
 std::uint64_t VirtualClock::ElapsedMicroseconds() const {
-    return impl_->time.Elapsed();
+    return time_->Elapsed();
 }
 
 void VirtualClock::HandleDeadlock(DeadlockHandler handler) {
-    impl_->time.HandleDeadlock(std::move(handler));
+    time_->HandleDeadlock(std::move(handler));
 }
 
 }  // namespace Varnholt::Simulator

@@ -7,6 +7,8 @@
 
 namespace Varnholt::Simulator {
 
+class VirtualTime;
+
 /// For tests: replaces the time of the whole platform layer by one that passes only while every thread waits.
 /// A time-out of five seconds costs microseconds, and what happens in which order is repeatable. Linux only.
 ///
@@ -44,8 +46,7 @@ class VirtualClock final {
     void HandleDeadlock(DeadlockHandler handler);
 
   private:
-    class Impl;
-    const std::unique_ptr<Impl> impl_;
+    const std::unique_ptr<VirtualTime> time_;
 };
 
 }  // namespace Varnholt::Simulator
