@@ -53,10 +53,9 @@ class UsbIpSession final : private Platform::Usb::TransferClient {
     bool Over() const { return over_; }
     /// Why it ended, for a log; empty while it runs and when it ended as it should.
     const std::string& Complaint() const { return complaint_; }
-    bool Imported() const { return device_ != nullptr; }
     /// Whether the peer has to go on soon: it may only be silent between two messages after an import.
     bool PeerIsDue() const {
-        return over_ || !Imported() || !input_.empty() || next_ == &UsbIpSession::SubmitPacket;
+        return over_ || !device_ || !input_.empty() || next_ == &UsbIpSession::SubmitPacket;
     }
 
   private:
@@ -66,7 +65,6 @@ class UsbIpSession final : private Platform::Usb::TransferClient {
     static constexpr std::size_t MostTransfers = 1024;
     static constexpr std::uint64_t MostPendingBytes = 64U << 20;
 
-    void HandleMessage();
     void HandleOperation();
     void HandleImport();
     void HandlePacketHeader();
