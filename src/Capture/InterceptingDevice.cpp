@@ -38,9 +38,8 @@ ErrorCode InterceptingDevice::Submit(Usb::Transfer& transfer) try {
 ErrorCode InterceptingDevice::PassOn(const CopyPointer& copy) {
     {
         const std::lock_guard lock(mutex_);
-        const auto found = running_.find(copy->original);
         const bool ends = copy->state == State::Held && copy->cancelWanted;
-        if (found == running_.end() || found->second != copy || ends) {
+        if (Find(*copy) == running_.end() || ends) {
             return Errors::Success;  // cancelled while it was held
         }
         copy->state = State::Submitting;
@@ -63,55 +62,46 @@ ErrorCode InterceptingDevice::PassOn(const CopyPointer& copy) {
 }
 
 void InterceptingDevice::Cancel(Usb::Transfer& transfer) {
+    EndFirst([&transfer](const auto& underWay) { return underWay.first == &transfer; },
+             TransferStatus::Cancelled);
+}
+
+void InterceptingDevice::EndAll(TransferStatus status, const InterceptedTransfer* except) {
+    const auto goesOn = [except](const auto& underWay) {
+        return !underWay.second->cancelWanted && underWay.second.get() != except;
+    };
+    while (EndFirst(goesOn, status)) {  // one at a time: this takes no memory
+    }
+}
+
+template <class Picks>
+bool InterceptingDevice::EndFirst(Picks picks, TransferStatus status) {
     CopyPointer copy;
     State state{};
     {
         const std::lock_guard lock(mutex_);
-        const auto found = running_.find(&transfer);
+        const auto found = std::ranges::find_if(running_, picks);
         if (found == running_.end()) {
-            return;
+            return false;
         }
         copy = found->second;
         copy->cancelWanted = true;
         state = copy->state;
     }
-    CancelIn(*copy, state, TransferStatus::Cancelled);
-}
-
-void InterceptingDevice::EndAll(TransferStatus status, const InterceptedTransfer* except) {
-    while (true) {  // one at a time: this takes no memory
-        CopyPointer copy;
-        State state{};
-        {
-            const std::lock_guard lock(mutex_);
-            const auto found = std::ranges::find_if(running_, [except](const auto& underWay) {
-                return !underWay.second->cancelWanted && underWay.second.get() != except;
-            });
-            if (found == running_.end()) {
-                return;
-            }
-            copy = found->second;
-            copy->cancelWanted = true;
-            state = copy->state;
-        }
-        CancelIn(*copy, state, status);
-    }
-}
-
-void InterceptingDevice::CancelIn(InterceptedTransfer& copy, State state, TransferStatus status) {
     switch (state) {
         case State::Submitting:
             break;  // whoever submits it looks at `cancelWanted` afterwards
         case State::InDevice:
-            device_->Cancel(copy);
+            device_->Cancel(*copy);
             break;
         case State::Held:
-            End(copy, status, 0);
+            End(*copy, status, 0);
             break;
         case State::HeldWithData:
-            End(copy, status, status == TransferStatus::Cancelled ? copy.actualLength : 0);
+            End(*copy, status, status == TransferStatus::Cancelled ? copy->actualLength : 0);
             break;
     }
+    return true;
 }
 
 void InterceptingDevice::TransferCompleted(Usb::Transfer& transfer) noexcept {
@@ -134,14 +124,18 @@ bool InterceptingDevice::HoldBack(InterceptedTransfer& copy, State state) {
 
 bool InterceptingDevice::IsUnderWay(const InterceptedTransfer& copy) {
     const std::lock_guard lock(mutex_);
+    return Find(copy) != running_.end();
+}
+
+InterceptingDevice::UnderWay::iterator InterceptingDevice::Find(const InterceptedTransfer& copy) {
     const auto found = running_.find(copy.original);
-    return found != running_.end() && found->second.get() == &copy;
+    return found != running_.end() && found->second.get() == &copy ? found : running_.end();
 }
 
 InterceptingDevice::CopyPointer InterceptingDevice::Take(const InterceptedTransfer& copy) {
     const std::lock_guard lock(mutex_);
-    const auto found = running_.find(copy.original);
-    if (found == running_.end() || found->second.get() != &copy) {
+    const auto found = Find(copy);
+    if (found == running_.end()) {
         return nullptr;
     }
     CopyPointer taken = std::move(found->second);

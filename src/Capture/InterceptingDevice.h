@@ -72,15 +72,20 @@ class InterceptingDevice : public Usb::UsbDevice, private Usb::TransferClient {
 
   private:
     void TransferCompleted(Usb::Transfer& transfer) noexcept final;
-    /// Cancels a copy that was in `state` when that was decided.
-    void CancelIn(InterceptedTransfer& copy, InterceptedTransfer::State state, Usb::TransferStatus status);
+    using UnderWay = std::map<const Usb::Transfer*, CopyPointer>;  // by the submitter's own
+
+    /// Ends the first transfer under way that `picks` picks, or has the device end it; false: there is none.
+    template <class Picks>
+    bool EndFirst(Picks picks, Usb::TransferStatus status);
+    /// With the lock held.
+    UnderWay::iterator Find(const InterceptedTransfer& copy);
     /// Takes a copy out of the ones under way; null when it has ended.
     CopyPointer Take(const InterceptedTransfer& copy);
 
     std::shared_ptr<Usb::UsbDevice> device_;
     std::mutex
         mutex_;  // guards what follows; not held while the device, a client or a derived class is called
-    std::map<const Usb::Transfer*, CopyPointer> running_;  // by the submitter's own
+    UnderWay running_;
     std::uint64_t lastId_ = 0;
 };
 
