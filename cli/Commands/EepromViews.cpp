@@ -1,8 +1,6 @@
 #include <fmt/format.h>
 #include <fmt/ostream.h>
 
-#include <algorithm>
-
 #include "Commands/CommonOptions.h"
 #include "Commands/Eeprom.h"
 #include "Memory/InputFile.h"
@@ -65,10 +63,7 @@ Json JsonOfImage(const MemoryTarget& target, ImageModel& model, const LogCopies&
 }
 
 void PrintRawAreas(Session& session, const EepromImage& image) {
-    const std::vector<std::uint8_t> block = BinaryBlockOf(image);
-    const auto used = block.size() - static_cast<std::size_t>(std::count(block.begin(), block.end(), 0xFF));
-    fmt::print(session.Out(), "\nBINARY BLOCK (10100): {}\n",
-               used == 0 ? "empty" : fmt::format("{} of {} bytes used", used, block.size()));
+    fmt::print(session.Out(), "\nBINARY BLOCK (10100): {}\n", UseOfBinaryBlock(image));
     session.Out() << "RAW WORDS (10200 to 10215):\n";
     constexpr std::uint16_t inARow = 8;
     for (std::uint16_t first = Ids::FirstRawWord; first <= LastWritableRawWord; first += inARow) {

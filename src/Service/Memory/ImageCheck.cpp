@@ -11,6 +11,7 @@
 #include "DeviceDriver/Ostra/LowLevel/PellandoEAT.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
+#include "Service/Memory/ImageEdit.h"
 #include "Service/Memory/ImageModel.h"
 #include "Service/Memory/PropertyText.h"
 
@@ -61,7 +62,7 @@ std::size_t CountUsed(std::span<const std::uint8_t> bytes) {
 
 class Checker final {
   public:
-    explicit Checker(const EepromImage& checked) : image_(checked), bytes_(checked) {}
+    explicit Checker(const EepromImage& checked) : image_(checked) {}
 
     std::vector<ImageFinding> Run() {
         if (CheckHeader()) {
@@ -243,21 +244,13 @@ class Checker final {
         };
         report("main copy", copies.main);
         report("second copy", copies.second);
-        if (copies.main.isValid && copies.second.isValid && !HaveSameValues(copies)) {
+        if (copies.main.isValid && copies.second.isValid &&
+            !HaveSameBytes(copies.main.items, copies.second.items)) {
             Add(Severity::Note, LogArea, "the two copies hold different values");
         }
         const bool isLost = !copies.main.isValid && !copies.second.isValid;
         Add(isLost ? Severity::Error : Severity::Fine, LogArea,
             std::string("the driver uses ") + (isLost ? "" : "the ") + copies.Used());
-    }
-
-    static bool HaveSameValues(const LogCopies& copies) {
-        const auto& main = copies.main.items.GetDatastore();
-        const auto& second = copies.second.items.GetDatastore();
-        return std::equal(
-            main.begin(), main.end(), second.begin(), second.end(), [](const auto& a, const auto& b) {
-                return a.first == b.first && a.second.AsByteVector(true) == b.second.AsByteVector(true);
-            });
     }
 
     void CheckCalibration(const Properties& calibration) {
@@ -284,10 +277,7 @@ class Checker final {
     }
 
     void CheckOtherAreas() {
-        const std::size_t binary = CountUsed(bytes_.subspan(Map::BinaryFirst, Map::BinaryFirstSize)) +
-                                   CountUsed(bytes_.subspan(Map::BinarySecond, Map::BinarySecondSize));
-        Add(Severity::Fine, "binary block",
-            binary == 0 ? "empty" : fmt::format("{} of {} bytes used", binary, Map::BinarySize));
+        Add(Severity::Fine, "binary block", UseOfBinaryBlock(image_));
         std::set<std::uint32_t> words;
         for (std::uint32_t at = Map::RawWords; at < Map::EndOfLogArea; ++at) {
             if (image_[at] != 0xFF) {
@@ -298,14 +288,14 @@ class Checker final {
             words.empty() ? "empty"
                           : fmt::format("{} of {} used", words.size(),
                                         (Map::EndOfLogArea - Map::RawWords) / Map::RawWordSize));
-        const std::size_t rest = CountUsed(bytes_.subspan(Map::Calibration + Map::CalibrationSize));
+        const std::size_t rest =
+            CountUsed(std::span(image_).subspan(Map::Calibration + Map::CalibrationSize));
         if (rest > 0) {
             Add(Severity::Note, "rest", fmt::format("{} bytes behind the calibration data are used", rest));
         }
     }
 
     const EepromImage& image_;
-    const std::span<const std::uint8_t> bytes_;
     std::vector<ImageFinding> findings_;
 };
 
@@ -313,6 +303,12 @@ class Checker final {
 
 std::vector<ImageFinding> CheckImage(const EepromImage& image) {
     return Checker(image).Run();
+}
+
+std::string UseOfBinaryBlock(const EepromImage& image) {
+    const std::vector<std::uint8_t> block = BinaryBlockOf(image);
+    const std::size_t used = CountUsed(block);
+    return used == 0 ? "empty" : fmt::format("{} of {} bytes used", used, block.size());
 }
 
 bool IsSane(const std::vector<ImageFinding>& findings) {

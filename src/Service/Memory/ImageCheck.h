@@ -24,6 +24,9 @@ struct ImageFinding {
 /// copies of the log, calibration, and the areas outside the table; and at what the driver would use.
 std::vector<ImageFinding> CheckImage(const EepromImage& image);
 
+/// "empty", or how many of its bytes are used.
+std::string UseOfBinaryBlock(const EepromImage& image);
+
 /// Nothing in it is an error.
 bool IsSane(const std::vector<ImageFinding>& findings);
 

@@ -22,16 +22,6 @@ namespace Ids = Protocol::PropertyIds;
 static_assert(Map::RawWords + (LastWritableRawWord + 1U - Ids::FirstRawWord) * Map::RawWordSize ==
               Map::EndOfLogArea);
 
-bool HaveSameBytes(const Properties& a, const Properties& b) {
-    const auto& left = a.GetDatastore();
-    const auto& right = b.GetDatastore();
-    return std::equal(left.begin(), left.end(), right.begin(), right.end(),
-                      [](const auto& one, const auto& other) {
-                          return one.first == other.first &&
-                                 one.second.AsByteVector(true) == other.second.AsByteVector(true);
-                      });
-}
-
 [[noreturn]] void RefuseOddTable() {
     throw Failure(FailureKind::BadData,
                   "the allocation table puts values where the change would reach others; nothing was changed",

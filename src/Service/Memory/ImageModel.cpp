@@ -63,6 +63,12 @@ Properties ImageModel::Table() {
     return LoadSet("EATData");
 }
 
+bool HaveSameBytes(const Properties& a, const Properties& b) {
+    return std::ranges::equal(a.GetDatastore(), b.GetDatastore(), [](const auto& one, const auto& other) {
+        return one.first == other.first && one.second.AsByteVector(true) == other.second.AsByteVector(true);
+    });
+}
+
 PellandoEAT TableOf(const EepromImage& image) {
     return PellandoEAT(image.begin() + EepromMap::Table);
 }

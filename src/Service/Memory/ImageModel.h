@@ -35,6 +35,10 @@ class ImageModel final {
     std::unique_ptr<Memory> memory_;
 };
 
+/// Whether two sets hold the same values, byte for byte, in the same order.
+bool HaveSameBytes(const DeviceDriver::Generic::Configuration::Properties& a,
+                   const DeviceDriver::Generic::Configuration::Properties& b);
+
 /// The allocation table of an image; throws what the memory model throws of one that it cannot use.
 DeviceDriver::Ostra::LowLevel::PellandoEAT TableOf(const EepromImage& image);
 
