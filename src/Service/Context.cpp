@@ -6,11 +6,6 @@
 namespace Varnholt::Service {
 namespace {
 
-class Untold final : public Progress {
-  public:
-    void Update(std::uint64_t) override {}
-};
-
 /// What this layer has found itself says already which instrument or file it is about.
 bool IsOwn(const std::exception_ptr& exception) {
     try {
@@ -45,12 +40,6 @@ Context::Context(Observer& toldObserver, Interruption& userInterruption,
 
 Context::~Context() {
     interruption_.SetAction({});
-}
-
-std::unique_ptr<Progress> Context::StartProgress(const std::string& title, std::uint64_t total,
-                                                 const std::string& unit) const {
-    auto progress = observer_.StartProgress(title, total, unit);
-    return progress != nullptr ? std::move(progress) : std::make_unique<Untold>();
 }
 
 void Context::Sleep(std::uint32_t milliseconds) const {

@@ -34,9 +34,6 @@ class Context final {
     Interruption& UserInterruption() const { return interruption_; }
     /// After an interruption: transfers may start again.
     void Resume() { files_.Resume(device_); }
-    /// As `Observer::StartProgress`, and never null.
-    std::unique_ptr<Progress> StartProgress(const std::string& title, std::uint64_t total,
-                                            const std::string& unit) const;
     /// Waits; throws `Failure` as soon as the user wants to end.
     void Sleep(std::uint32_t milliseconds) const;
 

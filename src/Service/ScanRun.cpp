@@ -60,7 +60,7 @@ void Stream(OpenedInstrument& instrument, const ScanSettings& settings, ScanReco
 
 void RunScan(OpenedInstrument& instrument, const ScanSettings& settings, RecordSink& sink,
              ScanReport& report) {
-    const auto progress = instrument.UsedContext().StartProgress("scanning", settings.total, "B");
+    const auto progress = instrument.UsedContext().Told().StartProgress("scanning", settings.total, "B");
     ScanRecorder recorder(settings.recordSize, sink,
                           [&progress](std::uint64_t bytes) { progress->Update(bytes); });
     const auto note = [&] {

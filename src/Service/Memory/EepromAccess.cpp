@@ -25,7 +25,7 @@ struct Advance {
 void WritePieces(OpenedInstrument& instrument, const EepromImage& wanted,
                  const std::vector<WritePiece>& pieces, Advance& advance) {
     const Context& context = instrument.UsedContext();
-    const auto progress = context.StartProgress("writing", pieces.size(), "pieces");
+    const auto progress = context.Told().StartProgress("writing", pieces.size(), "pieces");
     for (const WritePiece& piece : pieces) {
         context.UserInterruption().ThrowIfRequested();
         advance.begun = true;
@@ -91,7 +91,7 @@ std::vector<WritePiece> PiecesToWrite(const EepromImage& present, const EepromIm
 }
 
 EepromImage ReadEeprom(OpenedInstrument& instrument) {
-    const auto progress = instrument.UsedContext().StartProgress("reading", Protocol::EepromSize, "B");
+    const auto progress = instrument.UsedContext().Told().StartProgress("reading", Protocol::EepromSize, "B");
     EepromImage image;
     for (std::uint32_t at = 0; at < Protocol::EepromSize; at += Half) {
         std::vector<std::uint8_t> part(Half);
