@@ -67,8 +67,7 @@ std::vector<std::string> LoggedDeviceFiles::ListInterfaces(const Protocol::Guid&
 
 LoggedDeviceFiles::Handle LoggedDeviceFiles::Open(const std::string& path) {
     const Handle file = below_.Open(path);
-    const std::string interruptPipe = Native::PipeSuffix + std::to_string(Native::InterruptPipe);
-    if (file != Platform::InvalidHandle() && path.ends_with(interruptPipe)) {
+    if (file != Platform::InvalidHandle() && Native::SplitPipePath(path).pipe == Native::InterruptPipe) {
         const std::lock_guard holder(section_);
         interruptFiles_.push_back(file);
     }

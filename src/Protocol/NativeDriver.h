@@ -3,6 +3,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <string_view>
 
 #include "Protocol/Guid.h"
 
@@ -43,5 +44,19 @@ inline constexpr std::uint32_t ControlPipe = 0;
 inline constexpr std::uint32_t ReadPipe = 1;       ///< endpoint 0x82
 inline constexpr std::uint32_t WritePipe = 2;      ///< endpoint 0x03
 inline constexpr std::uint32_t InterruptPipe = 3;  ///< endpoint 0x84
+
+struct PipePath {
+    std::string_view device;
+    std::uint32_t pipe;
+};
+/// What a path names; any other path is that of a device.
+constexpr PipePath SplitPipePath(std::string_view path) {
+    constexpr std::string_view suffix = PipeSuffix;
+    const std::size_t end = path.rfind(suffix);
+    const bool isPipe = end != path.npos && path.size() - end == suffix.size() + 1 && path.back() >= '1' &&
+                        path.back() <= '3';
+    return isPipe ? PipePath{path.substr(0, end), static_cast<std::uint32_t>(path.back() - '0')}
+                  : PipePath{path, ControlPipe};
+}
 
 }  // namespace Varnholt::Protocol::NativeDriver

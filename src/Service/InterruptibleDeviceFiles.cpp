@@ -13,20 +13,11 @@ namespace Varnholt::Service {
 
 using namespace Platform;
 
+namespace Native = Protocol::NativeDriver;
+
 namespace {
-
 constexpr std::uint32_t AbortLimit = 2000;  // milliseconds
-
-/// The pipe below a device of the instrument's own driver, 0 for any other file.
-std::uint32_t NativePipeOf(const std::string& path) {
-    const std::string suffix = Protocol::NativeDriver::PipeSuffix;
-    const bool isPipe = path.size() > suffix.size() + 1 &&
-                        path.compare(path.size() - 1 - suffix.size(), suffix.size(), suffix) == 0;
-    const char last = path.empty() ? '0' : path.back();
-    return isPipe && last >= '1' && last <= '3' ? static_cast<std::uint32_t>(last - '0') : 0;
 }
-
-}  // namespace
 
 InterruptibleDeviceFiles::InterruptibleDeviceFiles(DeviceFileSystem& underlying) : below_(underlying) {}
 
@@ -59,29 +50,26 @@ bool InterruptibleDeviceFiles::IsInterrupted(Handle file) {
     const OpenedFile* const opened = Find(file);
     return opened != nullptr && !opened->waitsForButton &&
            std::ranges::any_of(interrupted_, [opened](const std::string& device) {
-               return device.empty() || opened->path == device ||
-                      opened->path.starts_with(device + Protocol::NativeDriver::PipeSuffix);
+               return device.empty() || opened->device == device;
            });
 }
 
 void InterruptibleDeviceFiles::AbortPipe(const OpenedFile& file) {
-    const std::uint32_t pipe = NativePipeOf(file.path);
-    if (pipe == 0) {
+    if (file.pipe == Native::ControlPipe) {
         Control(file.handle, Protocol::UsbIoDriver::Control::AbortPipe, nullptr, 0);
         return;
     }
-    const std::string device =
-        file.path.substr(0, file.path.size() - 1 - std::string(Protocol::NativeDriver::PipeSuffix).size());
-    const auto owner = std::ranges::find(files_, device, &OpenedFile::path);
+    const auto owner = std::ranges::find_if(files_, [&file](const OpenedFile& other) {
+        return other.device == file.device && other.pipe == Native::ControlPipe;
+    });
     if (owner == files_.end()) {
         return;
     }
-    Protocol::NativeDriver::ControlBlock block{};
-    Protocol::StoreLittle16(
-        &block[Protocol::NativeDriver::Block::Value],
-        pipe == Protocol::NativeDriver::ReadPipe ? Protocol::BulkInEndpoint : Protocol::BulkOutEndpoint);
-    Control(owner->handle, Protocol::NativeDriver::ControlAbortPipe, block.data(),
-            static_cast<std::uint32_t>(block.size()));
+    Native::ControlBlock block{};
+    Protocol::StoreLittle16(&block[Native::Block::Value], file.pipe == Native::ReadPipe
+                                                              ? Protocol::BulkInEndpoint
+                                                              : Protocol::BulkOutEndpoint);
+    Control(owner->handle, Native::ControlAbortPipe, block.data(), static_cast<std::uint32_t>(block.size()));
 }
 
 /// Failures do not matter: whoever waits for the transfers still has limits of his own.
@@ -115,8 +103,9 @@ Handle InterruptibleDeviceFiles::Open(const std::string& path) {
         return file;
     }
     try {
+        const auto [device, pipe] = Native::SplitPipePath(path);
         const std::lock_guard holder(section_);
-        files_.push_back({file, path, NativePipeOf(path) == Protocol::NativeDriver::InterruptPipe});
+        files_.push_back({file, std::string(device), pipe, pipe == Native::InterruptPipe});
         return file;
     } catch (const std::bad_alloc&) {
         below_.CloseFile(file);

@@ -50,7 +50,8 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
   private:
     struct OpenedFile {
         Handle handle;
-        std::string path;
+        std::string device;
+        std::uint32_t pipe;   ///< of the instrument's own driver
         bool waitsForButton;  ///< the interrupt pipe's
     };
     struct RunningTransfer {

@@ -24,13 +24,6 @@ bool IsNative(const std::string& path) {
     return path.starts_with("native/");
 }
 
-/// Of the native driver's pipes; a file of the other one gets its endpoint later.
-std::uint32_t PipeOf(const std::string& path) {
-    const std::string suffix = Protocol::NativeDriver::PipeSuffix;
-    const std::size_t at = path.rfind(suffix);
-    return at == std::string::npos ? 0 : static_cast<std::uint32_t>(path.at(at + suffix.size()) - '0');
-}
-
 std::string Line(const char* what, std::uint32_t number) {
     char text[32];
     std::snprintf(text, sizeof text, "%s %X", what, number);
@@ -152,7 +145,7 @@ Handle ScriptedDriver::Open(const std::string& path) {
     }
     const std::lock_guard held(lock_);
     transcript_.push_back("open " + path);
-    files_.push_back(std::make_unique<File>(File{path, PipeOf(path)}));
+    files_.push_back(std::make_unique<File>(File{path, Protocol::NativeDriver::SplitPipePath(path).pipe}));
     return files_.back().get();
 }
 

@@ -36,17 +36,10 @@ std::optional<DevicePath> Parse(std::string_view path) {
         return std::nullopt;
     }
     path.remove_prefix(isUsbIo ? UsbIoPrefix.size() : NativePrefix.size());
-    const std::string_view name = path.substr(0, path.find('\\'));
-    path.remove_prefix(name.size());
-    std::uint32_t pipe = Protocol::NativeDriver::ControlPipe;
-    if (!path.empty()) {
-        constexpr std::string_view Suffix = Protocol::NativeDriver::PipeSuffix;
-        const bool isPipe = path.size() == Suffix.size() + 1 && path.starts_with(Suffix) &&
-                            path.back() >= '1' && path.back() <= '3';
-        if (isUsbIo || !isPipe) {
-            return std::nullopt;
-        }
-        pipe = static_cast<std::uint32_t>(path.back() - '0');
+    const auto [name, pipe] = Protocol::NativeDriver::SplitPipePath(path);
+    const bool isPipe = pipe != Protocol::NativeDriver::ControlPipe;
+    if (name.find('\\') != name.npos || (isUsbIo && isPipe)) {
+        return std::nullopt;
     }
     return DevicePath{isUsbIo, std::string(name), pipe};
 }
