@@ -54,7 +54,7 @@ TEST(DoctorTest, NamesTheReasonAndTheFix) {
     constexpr const char* answers = "answers (firmware 301)";
     constexpr const char* locked = "no permission on /dev/bus/usb/001/007";
     auto held = Plugged();
-    held.holders = {{42, "python3"}};
+    held.holder = "python3 (process 42)";
     auto lockedAndHeld = held;
     lockedAndHeld.isAccessible = false;
     auto other = Plugged();

@@ -12,6 +12,7 @@
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/WaitableObjects.h"
 #include "Service/Instruments.h"
+#include "Service/Linux/DeviceHolder.h"
 #include "Service/Linux/UdevRule.h"
 #include "Service/SystemAdvice.h"
 
@@ -64,44 +65,36 @@ std::string WayToPermission(const DeviceFacts& device, const GroupFacts& group) 
                        InstrumentGroup, steps);
 }
 
-void JudgeDevice(const DeviceFacts& facts, const GroupFacts& group, const Trial& trial,
-                 std::vector<Finding>& findings) {
+/// The verdict; what else is worth knowing is added to `notes`.
+Finding JudgeDevice(const DeviceFacts& facts, const GroupFacts& group, const Trial& trial,
+                    std::vector<Finding>& notes) {
     const UsbDeviceInfo& device = facts.info;
     const std::string subject = NameOf(device);
     const std::string id = device.vendorId + ":" + device.productId;
     if (!facts.hasEndpoints) {
-        findings.push_back({Level::Problem, subject,
-                            "is registered but does not have the instrument's endpoints",
-                            "sudo ostra register --remove " + id, FailureKind::NotFound});
-        return;
+        return {Level::Problem, subject, "is registered but does not have the instrument's endpoints",
+                "sudo ostra register --remove " + id, FailureKind::NotFound};
     }
     if (!device.registered) {
-        findings.push_back({Level::Problem, subject, "has the instrument's endpoints but is not registered",
-                            "sudo ostra register " + id, FailureKind::NotFound});
-        return;
+        return {Level::Problem, subject, "has the instrument's endpoints but is not registered",
+                "sudo ostra register " + id, FailureKind::NotFound};
     }
     if (!facts.isAccessible) {
-        findings.push_back({Level::Problem, subject,
-                            "no permission on " + device.deviceNode + WhoMayUse(facts, group),
-                            WayToPermission(facts, group), FailureKind::NoPermission});
-        return;
+        return {Level::Problem, subject, "no permission on " + device.deviceNode + WhoMayUse(facts, group),
+                WayToPermission(facts, group), FailureKind::NoPermission};
     }
-    if (!facts.holders.empty()) {
-        findings.push_back({Level::Problem, subject,
-                            fmt::format("is in use by {} (process {})", facts.holders.front().name,
-                                        facts.holders.front().processId),
-                            EndTheOther, FailureKind::InUse});
-        return;
+    if (!facts.holder.empty()) {
+        return {Level::Problem, subject, "is in use by " + facts.holder, EndTheOther, FailureKind::InUse};
     }
     if (!device.kernelDriver.empty() && device.kernelDriver != ProgramAsDriver) {
-        findings.push_back(
+        notes.push_back(
             {Level::Note, subject,
              fmt::format(
                  "the kernel driver {} holds its interface; it gives way while the instrument is open",
                  device.kernelDriver),
              ""});
     }
-    findings.push_back(JudgeAnswer(subject, trial(device.name)));
+    return JudgeAnswer(subject, trial(device.name));
 }
 
 Finding JudgeSimulator(const Platform::Usb::SimulatorInfo& simulator, const Trial& trial) {
@@ -173,7 +166,7 @@ MachineFacts LookAround(const Context& context) {
     MachineFacts facts;
     for (const UsbDeviceInfo& device : Platform::Usb::ListCandidateDevices()) {
         facts.devices.push_back({device, true, access(device.deviceNode.c_str(), R_OK | W_OK) == 0,
-                                 GroupOf(device.deviceNode), FindHolders(device.deviceNode)});
+                                 GroupOf(device.deviceNode), FindHolder(device.deviceNode)});
     }
     for (const UsbDeviceInfo& device : Platform::Usb::ListRegisteredDevices()) {
         const bool isCandidate = std::ranges::any_of(
@@ -205,7 +198,8 @@ Answer Try(Context& context, const std::string& shortName) {
 std::vector<Finding> Judge(const MachineFacts& facts, const Trial& trial) {
     std::vector<Finding> findings;
     for (const DeviceFacts& device : facts.devices) {
-        JudgeDevice(device, facts.group, trial, findings);
+        const Finding verdict = JudgeDevice(device, facts.group, trial, findings);
+        findings.push_back(verdict);
     }
     for (const auto& simulator : facts.simulators) {
         findings.push_back(JudgeSimulator(simulator, trial));

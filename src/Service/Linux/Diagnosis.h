@@ -7,7 +7,6 @@
 #include "Platform/Usb/SimulatorBus.h"
 #include "Platform/Usb/UdevBus.h"
 #include "Service/Finding.h"
-#include "Service/Linux/DeviceHolders.h"
 
 namespace Varnholt::Service {
 
@@ -17,7 +16,7 @@ struct DeviceFacts {
     bool hasEndpoints = true;  ///< the instrument's
     bool isAccessible = true;  ///< its node may be read and written
     std::string group{};       ///< whose members may do so; empty: none
-    std::vector<DeviceHolder> holders{};
+    std::string holder{};      ///< another process that has it open, as `FindHolder` tells it
 };
 /// How the user stands to the group that registered instruments belong to.
 struct GroupFacts {

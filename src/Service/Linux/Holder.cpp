@@ -1,22 +1,17 @@
 #include "Service/Holder.h"
 
-#include <fmt/format.h>
-
 #include "Platform/Usb/SimulatorBus.h"
 #include "Platform/Usb/UdevBus.h"
 #include "Service/Instruments.h"
-#include "Service/Linux/DeviceHolders.h"
+#include "Service/Linux/DeviceHolder.h"
 
 namespace Varnholt::Service {
 
 std::string HolderOf(const std::string& identifier) {
     const std::string name = ShortNameOf(identifier);
     for (const auto& device : Platform::Usb::ListRegisteredDevices()) {
-        if (device.name != name) {
-            continue;
-        }
-        for (const auto& holder : FindHolders(device.deviceNode)) {
-            return fmt::format("{} (process {})", holder.name, holder.processId);
+        if (device.name == name) {
+            return FindHolder(device.deviceNode);
         }
     }
     for (const auto& simulator : Platform::Usb::ListSimulators()) {

@@ -1,5 +1,6 @@
-#include "Service/Linux/DeviceHolders.h"
+#include "Service/Linux/DeviceHolder.h"
 
+#include <fmt/format.h>
 #include <unistd.h>
 
 #include <charconv>
@@ -25,23 +26,21 @@ bool HasOpen(const fs::path& process, const std::string& deviceNode) {
 
 }  // namespace
 
-std::vector<DeviceHolder> FindHolders(const std::string& deviceNode) {
-    std::vector<DeviceHolder> holders;
+std::string FindHolder(const std::string& deviceNode) {
     std::error_code error;
     for (fs::directory_iterator process("/proc", error), end; !error && process != end;
          process.increment(error)) {
         const std::string number = process->path().filename();
-        DeviceHolder holder;
-        const auto [next, failure] =
-            std::from_chars(number.data(), number.data() + number.size(), holder.processId);
-        if (failure != std::errc() || next != number.data() + number.size() || holder.processId == getpid() ||
-            !HasOpen(process->path(), deviceNode)) {
-            continue;
+        int id = 0;
+        const auto [next, failure] = std::from_chars(number.data(), number.data() + number.size(), id);
+        if (failure == std::errc() && next == number.data() + number.size() && id != getpid() &&
+            HasOpen(process->path(), deviceNode)) {
+            std::string name;
+            std::ifstream(process->path() / "comm") >> name;
+            return fmt::format("{} (process {})", name, id);
         }
-        std::ifstream(process->path() / "comm") >> holder.name;
-        holders.push_back(holder);
     }
-    return holders;
+    return {};
 }
 
 }  // namespace Varnholt::Service
