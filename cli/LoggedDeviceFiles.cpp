@@ -78,38 +78,35 @@ bool LoggedDeviceFiles::CloseFile(Handle file) {
     {
         const std::lock_guard holder(section_);
         std::erase(interruptFiles_, file);
-        std::erase_if(running_, [file](const RunningTransfer& transfer) { return transfer.file == file; });
+        std::erase_if(running_, [file](const auto& transfer) { return transfer.second.file == file; });
     }
     return below_.CloseFile(file);
 }
 
-void LoggedDeviceFiles::Tell(const Description& describe, std::uint32_t transferred, bool succeeded) {
+/// The caller finds the last error as it was.
+void LoggedDeviceFiles::Ended(const Overlapped& record, std::uint32_t transferred, bool succeeded) {
     const Platform::ErrorCode code = Platform::LastError();
     {
         const std::lock_guard holder(section_);
-        log_(describe(transferred) + (succeeded ? "" : TextOfFailure(code)));
+        if (const auto found = running_.find(&record); found != running_.end()) {
+            log_(found->second.describe(transferred) + (succeeded ? "" : TextOfFailure(code)));
+            running_.erase(found);
+        }
     }
     Platform::SetLastError(code);
 }
 
 template <class Start>
-bool LoggedDeviceFiles::StartTransfer(Handle file, const Overlapped& record, const Description& describe,
+bool LoggedDeviceFiles::StartTransfer(Handle file, const Overlapped& record, Description describe,
                                       Start start) {
     {
         // Before the start: its end may be learnt of on another thread.
         const std::lock_guard holder(section_);
-        std::erase_if(running_,
-                      [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
-        running_.push_back({&record, file, describe});
+        running_[&record] = {file, std::move(describe)};
     }
     const bool completed = start();
     if (!completed && Platform::LastError() != Platform::Errors::IoPending) {
-        Tell(describe, 0, false);
-        const Platform::ErrorCode code = Platform::LastError();
-        const std::lock_guard holder(section_);
-        std::erase_if(running_,
-                      [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
-        Platform::SetLastError(code);
+        Ended(record, 0, false);
     }
     return completed;
 }
@@ -166,22 +163,8 @@ bool LoggedDeviceFiles::StartControl(Handle file, std::uint32_t code, const void
 
 bool LoggedDeviceFiles::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) {
     const bool succeeded = below_.GetResult(file, record, transferred, wait);
-    const Platform::ErrorCode code = Platform::LastError();
-    if (!succeeded && code == Platform::Errors::IoIncomplete) {
-        return false;
-    }
-    Description describe;
-    {
-        const std::lock_guard holder(section_);
-        const auto found = std::ranges::find(running_, &record, &RunningTransfer::record);
-        if (found != running_.end()) {
-            describe = std::move(found->describe);
-            running_.erase(found);
-        }
-    }
-    Platform::SetLastError(code);
-    if (describe) {
-        Tell(describe, transferred, succeeded);
+    if (succeeded || Platform::LastError() != Platform::Errors::IoIncomplete) {
+        Ended(record, transferred, succeeded);
     }
     return succeeded;
 }

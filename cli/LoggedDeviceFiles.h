@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <map>
 #include <string>
 #include <vector>
 
@@ -39,19 +40,18 @@ class LoggedDeviceFiles final : public Platform::DeviceFileSystem {
     /// What a transfer was, once it is known how many bytes it has moved.
     using Description = std::function<std::string(std::uint32_t transferred)>;
     struct RunningTransfer {
-        const Overlapped* record;
         Handle file;
         Description describe;
     };
 
     template <class Start>
-    bool StartTransfer(Handle file, const Overlapped& record, const Description& describe, Start start);
-    void Tell(const Description& describe, std::uint32_t transferred, bool succeeded);
+    bool StartTransfer(Handle file, const Overlapped& record, Description describe, Start start);
+    void Ended(const Overlapped& record, std::uint32_t transferred, bool succeeded);
 
     Platform::DeviceFileSystem& below_;
     const Log log_;
     Platform::RecursiveMutex section_;  ///< guards what follows, and the log
-    std::vector<RunningTransfer> running_;
+    std::map<const Overlapped*, RunningTransfer> running_;
     std::vector<Handle> interruptFiles_;  ///< whose reads wait for the button
 };
 

@@ -25,8 +25,8 @@ void InterruptibleDeviceFiles::Interrupt(const std::string& device) {
     const std::lock_guard holder(section_);
     interrupted_.push_back(device);
     for (const OpenedFile& file : files_) {
-        const bool isBusy =
-            std::ranges::find(running_, file.handle, &RunningTransfer::file) != running_.end();
+        const bool isBusy = std::ranges::any_of(
+            running_, [&file](const auto& transfer) { return transfer.second == file.handle; });
         if (isBusy && IsInterrupted(file.handle)) {
             AbortPipe(file);
         }
@@ -118,7 +118,7 @@ bool InterruptibleDeviceFiles::CloseFile(Handle file) {
     {
         const std::lock_guard holder(section_);
         std::erase_if(files_, [file](const OpenedFile& opened) { return opened.handle == file; });
-        std::erase_if(running_, [file](const RunningTransfer& transfer) { return transfer.file == file; });
+        std::erase_if(running_, [file](const auto& transfer) { return transfer.second == file; });
     }
     return below_.CloseFile(file);
 }
@@ -140,13 +140,11 @@ bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, St
     if (IsInterrupted(file)) {
         return Refuse(record, Errors::OperationAborted);
     }
-    std::erase_if(running_,
-                  [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
-    running_.push_back({&record, file});
+    running_[&record] = file;
     const bool completed = start();
     if (!completed && LastError() != Errors::IoPending) {
         const ErrorCode code = LastError();
-        running_.pop_back();
+        running_.erase(&record);
         SetLastError(code);
     }
     return completed;
@@ -191,8 +189,7 @@ bool InterruptibleDeviceFiles::GetResult(Handle file, Overlapped& record, std::u
     }
     {
         const std::lock_guard holder(section_);
-        std::erase_if(running_,
-                      [&record](const RunningTransfer& transfer) { return transfer.record == &record; });
+        running_.erase(&record);
     }
     SetLastError(code);
     return succeeded;

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <map>
 #include <string>
 #include <vector>
 
@@ -54,10 +55,6 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
         std::uint32_t pipe;   ///< of the instrument's own driver
         bool waitsForButton;  ///< the interrupt pipe's
     };
-    struct RunningTransfer {
-        const Overlapped* record;
-        Handle file;
-    };
 
     template <class Start>
     bool StartTransfer(Handle file, Overlapped& record, Start start);
@@ -72,7 +69,7 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
     Platform::RecursiveMutex section_;
     std::vector<std::string> interrupted_;  ///< devices; an empty one: all
     std::vector<OpenedFile> files_;
-    std::vector<RunningTransfer> running_;
+    std::map<const Overlapped*, Handle> running_;  ///< whose reads and writes run, and on which file
 };
 
 }  // namespace Varnholt::Service
