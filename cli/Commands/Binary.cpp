@@ -41,9 +41,8 @@ void PutBinary(Session& session, const PutBinaryOptions& options) {
         ReadFileOfSize(session, options.file, Protocol::EepromMap::BinarySize, "a binary block",
                        "`ostra binary get FILE` saves the one of an instrument");
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
-    const MemoryTarget::Outcome outcome =
-        target.Change(WithBinaryBlock(target.Image(), block), options.change, Granularity::Elements);
-    target.Report(outcome, options.memory.json, {{"file", options.file}});
+    target.Change(WithBinaryBlock(target.Image(), block), options.change, Granularity::Elements,
+                  {{"file", options.file}});
 }
 
 }  // namespace

@@ -14,14 +14,10 @@ namespace {
 
 using namespace Service;
 
-struct ShowCalibrationOptions {
-    MemoryOptions memory;
-};
-
-void ShowCalibration(Session& session, const ShowCalibrationOptions& options) {
-    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+void ShowCalibration(Session& session, const MemoryOptions& options) {
+    const MemoryTarget target(session, options, MemoryTarget::Use::Read);
     ImageModel model = target.Interpret([](const EepromImage& image) { return ImageModel(image); });
-    if (options.memory.json) {
+    if (options.json) {
         session.Print({{"source", target.Name()}, {"calibration", model.Calibration()}});
     } else {
         PrintValues(session, model.Calibration(), Vectors::Numbers);
@@ -39,7 +35,6 @@ void SetCalibration(Session& session, const SetCalibrationOptions& options) {
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     const EditedImage edited = target.Interpret(
         [&assignments](const EepromImage& image) { return WithCalibration(image, assignments); });
-    const MemoryTarget::Outcome outcome = target.Change(edited.image, options.change, Granularity::Elements);
     Rows changes({{"ID", "id", Table::Align::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}});
     for (const ValueChange& change : edited.changes) {
         changes.Add({change.id,
@@ -47,10 +42,8 @@ void SetCalibration(Session& session, const SetCalibrationOptions& options) {
                      "->",
                      {TextOf(change.after), Json(change.after)}});
     }
-    if (!options.memory.json) {
-        changes.Print(session.Out());
-    }
-    target.Report(outcome, options.memory.json, {{"changes", changes.AsJson()}});
+    target.Change(edited.image, options.change, Granularity::Elements, {{"changes", changes.AsJson()}},
+                  [&] { changes.Print(session.Out()); });
 }
 
 }  // namespace
@@ -58,9 +51,9 @@ void SetCalibration(Session& session, const SetCalibrationOptions& options) {
 void AddCalibration(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("calibration", "show and set calibration values");
 
-    const auto show = std::make_shared<ShowCalibrationOptions>();
+    const auto show = std::make_shared<MemoryOptions>();
     CommandSpec command = group.AddCommand("show", "show the calibration values");
-    AddMemoryOptions(command, show->memory);
+    AddMemoryOptions(command, *show);
     SetAction(command, session, show, ShowCalibration);
 
     const auto set = std::make_shared<SetCalibrationOptions>();

@@ -63,23 +63,18 @@ void CheckBeforeWriting(Session& session, const WriteOptions& options, const Eep
     session.Warn(ShownSource(options.file) + ": " + errors);
 }
 
-void WriteOrRestore(Session& session, const WriteOptions& options, const ChangeOptions& change) {
+void Write(Session& session, const WriteOptions& options) {
     const EepromImage image = ReadImageFile(session, options.file);
     CheckBeforeWriting(session, options, image);
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
-    const MemoryTarget::Outcome outcome = target.Change(image, change, Granularity::Pieces);
-    target.Report(outcome, options.memory.json, {{"file", options.file}});
-}
-
-void Write(Session& session, const WriteOptions& options) {
-    WriteOrRestore(session, options, options.change);
+    target.Change(image, options.change, Granularity::Pieces, {{"file", options.file}});
 }
 
 void Restore(Session& session, const WriteOptions& options) {
     // What there is now is what somebody wants to be rid of.
-    ChangeOptions change = options.change;
-    change.noBackup = change.backupFile.empty();
-    WriteOrRestore(session, options, change);
+    WriteOptions restoring = options;
+    restoring.change.noBackup = options.change.backupFile.empty();
+    Write(session, restoring);
 }
 
 void New(Session& session, const BackupOptions& options) {

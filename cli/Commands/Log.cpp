@@ -46,11 +46,8 @@ struct ResetLogOptions {
 void ResetLog(Session& session, const ResetLogOptions& options) {
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     const EepromImage empty = target.Interpret(WithEmptyLog);
-    const MemoryTarget::Outcome outcome = target.Change(empty, options.change, Granularity::Elements);
-    if (!options.memory.json) {
-        session.Out() << "empty log: ";
-    }
-    target.Report(outcome, options.memory.json, Json(Json::Object()));
+    target.Change(empty, options.change, Granularity::Elements, Json::Object(),
+                  [&session] { session.Out() << "empty log: "; });
 }
 
 }  // namespace

@@ -74,11 +74,8 @@ void PutWord(Session& session, const PutWordOptions& options) {
         SetRawWord(edited, word.id, word.value);
         changes.Add({word.id, cell(before), "->", cell(word.value)});
     }
-    const MemoryTarget::Outcome outcome = target.Change(edited, options.change, Granularity::Elements);
-    if (!options.memory.json) {
-        changes.Print(session.Out());
-    }
-    target.Report(outcome, options.memory.json, {{"changes", changes.AsJson()}});
+    target.Change(edited, options.change, Granularity::Elements, {{"changes", changes.AsJson()}},
+                  [&] { changes.Print(session.Out()); });
 }
 
 }  // namespace

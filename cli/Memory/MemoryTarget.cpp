@@ -3,6 +3,8 @@
 #include <fmt/format.h>
 
 #include <filesystem>
+#include <functional>
+#include <numeric>
 #include <ostream>
 
 #include "Commands/CommonOptions.h"
@@ -33,11 +35,7 @@ std::string CountOf(std::size_t count, const char* what) {
 }
 
 std::uint32_t CountDifferences(const EepromImage& a, const EepromImage& b) {
-    std::uint32_t count = 0;
-    for (std::size_t i = 0; i < a.size(); ++i) {
-        count += a[i] != b[i] ? 1U : 0U;
-    }
-    return count;
+    return std::transform_reduce(a.begin(), a.end(), b.begin(), 0U, std::plus(), std::not_equal_to());
 }
 
 }  // namespace
@@ -71,7 +69,7 @@ void AddChangeOptions(CommandSpec command, ChangeOptions& options, BackupHabit h
 }
 
 MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, Use use)
-    : session_(usedSession), file_(options.imageFile) {
+    : session_(usedSession), json_(options.json), file_(options.imageFile) {
     if (!file_.empty()) {
         if (use == Use::Change) {
             RefuseToChangeInPlace(file_);
@@ -124,9 +122,9 @@ std::string MemoryTarget::WayBack(const std::string& backup) const {
                        IsSane(CheckImage(image_)) ? "" : " --force");
 }
 
-MemoryTarget::Outcome MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& options,
-                                           Granularity granularity) {
-    Outcome outcome{options.dryRun, CountDifferences(image_, wanted), 0, {}};
+MemoryTarget::Outcome MemoryTarget::Make(const EepromImage& wanted, const ChangeOptions& options,
+                                         Granularity granularity) {
+    Outcome outcome{CountDifferences(image_, wanted), 0, {}};
     if (instrument_) {
         if (options.dryRun) {
             outcome.pieces = PiecesToWrite(image_, wanted, granularity).size();
@@ -146,10 +144,12 @@ MemoryTarget::Outcome MemoryTarget::Change(const EepromImage& wanted, const Chan
     return outcome;
 }
 
-void MemoryTarget::Report(const Outcome& outcome, bool asJson, const Json& details) const {
-    if (asJson) {
+void MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& options, Granularity granularity,
+                          const Json& details, const std::function<void()>& lead) {
+    const Outcome outcome = Make(wanted, options, granularity);
+    if (json_) {
         Json result = {{"target", name_},
-                       {"dryRun", outcome.dryRun},
+                       {"dryRun", options.dryRun},
                        {"changedBytes", outcome.bytes},
                        {"pieces", outcome.pieces},
                        {"backup", Json::OrNull(outcome.backup)}};
@@ -157,15 +157,16 @@ void MemoryTarget::Report(const Outcome& outcome, bool asJson, const Json& detai
         session_.Print(result);
         return;
     }
+    lead();
     if (outcome.bytes == 0) {
         session_.Out() << name_ << " holds this already; nothing to write\n";
         return;
     }
     const bool isInstrument = outcome.pieces > 0;
     session_.Out() << CountOf(outcome.bytes, "byte") << " of " << name_
-                   << (outcome.dryRun ? " would be changed" : " changed")
+                   << (options.dryRun ? " would be changed" : " changed")
                    << (isInstrument ? " in " + CountOf(outcome.pieces, "piece") : "")
-                   << (isInstrument && !outcome.dryRun ? ", read back and compared" : "") << '\n';
+                   << (isInstrument && !options.dryRun ? ", read back and compared" : "") << '\n';
 }
 
 }  // namespace Varnholt::Cli

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -59,27 +60,29 @@ class MemoryTarget final {
         }
     }
 
+    /// Makes the content `wanted` and tells the user: as JSON, with the members of `details`, or in a line
+    /// behind what `lead` prints. A file is replaced as a whole. Of an instrument a backup is made, only what
+    /// differs is written, and all is read back.
+    void Change(
+        const Service::EepromImage& wanted, const ChangeOptions& options, Service::Granularity granularity,
+        const Json& details, const std::function<void()>& lead = [] {});
+
+  private:
     /// What a change did, or with a dry run would have done.
     struct Outcome {
-        bool dryRun = false;
         std::uint32_t bytes = 0;  ///< that differ
         std::size_t pieces = 0;   ///< written to an instrument
         std::string backup;       ///< file with the earlier content; empty: none was made
     };
-    /// Makes the content `wanted`. A file is replaced as a whole. Of an instrument a backup is made, only
-    /// what differs is written, and all is read back.
-    Outcome Change(const Service::EepromImage& wanted, const ChangeOptions& options,
-                   Service::Granularity granularity);
 
-    /// Tells the user of a change; as JSON if it is wanted, then with the members of `details` as well.
-    void Report(const Outcome& outcome, bool asJson, const Json& details) const;
-
-  private:
+    Outcome Make(const Service::EepromImage& wanted, const ChangeOptions& options,
+                 Service::Granularity granularity);
     Failure Unusable(const std::string& reason) const;
     std::string MakeBackup(const ChangeOptions& options);
     std::string WayBack(const std::string& backup) const;
 
     Session& session_;
+    const bool json_;
     std::string file_;
     std::optional<Service::OpenedInstrument> instrument_;
     std::string name_;
