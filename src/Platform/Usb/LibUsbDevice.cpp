@@ -8,6 +8,7 @@
 #include <chrono>
 #include <condition_variable>
 #include <mutex>
+#include <new>
 #include <thread>
 #include <vector>
 
@@ -28,17 +29,13 @@ constexpr int ConfigurationValue = 1;
 constexpr auto ClaimPatience = std::chrono::milliseconds(2000);
 constexpr auto ClaimRetryPause = std::chrono::milliseconds(20);
 
-/// A transfer under way: libusb's record, and for control transfers the buffer with the setup bytes in front.
+/// What a transfer needs while it is under way: libusb's record, and for control transfers the buffer with
+/// the setup bytes in front. Used again and again.
 struct Submission {
-    class LibUsbDevice* device = nullptr;
-    libusb_transfer* transfer = nullptr;
-    Transfer* owner = nullptr;
-    std::vector<std::uint8_t> controlBuffer;
-
-    Submission() : transfer(libusb_alloc_transfer(0)) {}
-    ~Submission() { libusb_free_transfer(transfer); }
-    Submission(const Submission&) = delete;
-    Submission& operator=(const Submission&) = delete;
+    class LibUsbDevice* device;
+    std::unique_ptr<libusb_transfer, ReleasedBy<libusb_free_transfer>> transfer{libusb_alloc_transfer(0)};
+    Transfer* owner = nullptr;  ///< null: free for the next
+    std::vector<std::uint8_t> controlBuffer{};
 };
 
 using Context = std::unique_ptr<libusb_context, ReleasedBy<libusb_exit>>;
@@ -56,10 +53,12 @@ class LibUsbDevice final : public UsbDevice {
         {
             events_->HandleAlways();  // nobody needs to wait any more
             std::unique_lock lock(mutex_);
-            for (Submission* submission : running_) {
-                libusb_cancel_transfer(submission->transfer);
+            for (const auto& submission : submissions_) {
+                if (submission->owner) {
+                    libusb_cancel_transfer(submission->transfer.get());
+                }
             }
-            idle_.wait(lock, [this] { return running_.empty() && completing_ == 0; });
+            idle_.wait(lock, [this] { return running_ == 0; });
         }
         Release();
         events_->Stop();
@@ -81,7 +80,8 @@ class LibUsbDevice final : public UsbDevice {
   private:
     static void LIBUSB_CALL Completed(libusb_transfer* transfer);
     void Complete(Submission& submission);
-    std::unique_ptr<Submission> TakeSpare();
+    Submission& FreeSubmission();
+    void Fill(Submission& submission, const Transfer& transfer);
 
     // Closed in reverse order.
     const Linux::FileDescriptor file_;
@@ -91,9 +91,8 @@ class LibUsbDevice final : public UsbDevice {
 
     std::mutex mutex_;  // guards what follows; never held while a client is called
     std::condition_variable idle_;
-    std::vector<Submission*> running_;
-    std::vector<std::unique_ptr<Submission>> spare_;
-    int completing_ = 0;  // clients being told of a completion
+    std::vector<std::unique_ptr<Submission>> submissions_;
+    int running_ = 0;  // transfers whose clients have not been told of their end yet
     bool claimed_ = false;
 };
 
@@ -151,62 +150,60 @@ void LibUsbDevice::Release() {
     }
 }
 
-std::unique_ptr<Submission> LibUsbDevice::TakeSpare() {
-    const std::lock_guard lock(mutex_);
-    if (spare_.empty()) {
-        return nullptr;
+Submission& LibUsbDevice::FreeSubmission() {
+    const auto isFree = [](const auto& submission) { return submission->owner == nullptr; };
+    const auto found = std::ranges::find_if(submissions_, isFree);
+    if (found != submissions_.end()) {
+        return **found;
     }
-    std::unique_ptr<Submission> submission = std::move(spare_.back());
-    spare_.pop_back();
-    return submission;
+    auto submission = std::make_unique<Submission>(this);
+    if (!submission->transfer) {
+        throw std::bad_alloc();
+    }
+    return *submissions_.emplace_back(std::move(submission));
 }
 
-ErrorCode LibUsbDevice::Submit(Transfer& transfer) {
-    std::unique_ptr<Submission> submission = TakeSpare();
-    if (!submission) {
-        submission = std::make_unique<Submission>();
-        if (!submission->transfer) {
-            return Errors::NotEnoughMemory;
-        }
-        submission->device = this;
-    }
-    submission->owner = &transfer;
+void LibUsbDevice::Fill(Submission& submission, const Transfer& transfer) {
+    libusb_transfer* const target = submission.transfer.get();
     if (transfer.endpoint == 0) {
-        auto& buffer = submission->controlBuffer;
+        auto& buffer = submission.controlBuffer;
         buffer.resize(LIBUSB_CONTROL_SETUP_SIZE + transfer.length);
         libusb_fill_control_setup(buffer.data(), transfer.setup.requestType, transfer.setup.request,
                                   transfer.setup.value, transfer.setup.index, transfer.setup.length);
         if (!transfer.IsIn()) {
             std::copy_n(transfer.data, transfer.length, buffer.begin() + LIBUSB_CONTROL_SETUP_SIZE);
         }
-        libusb_fill_control_transfer(submission->transfer, handle_.get(), buffer.data(),
-                                     &LibUsbDevice::Completed, submission.get(), 0);
+        libusb_fill_control_transfer(target, handle_.get(), buffer.data(), &LibUsbDevice::Completed,
+                                     &submission, 0);
     } else {
-        libusb_fill_bulk_transfer(submission->transfer, handle_.get(), transfer.endpoint, transfer.data,
-                                  static_cast<int>(transfer.length), &LibUsbDevice::Completed,
-                                  submission.get(), 0);
+        libusb_fill_bulk_transfer(target, handle_.get(), transfer.endpoint, transfer.data,
+                                  static_cast<int>(transfer.length), &LibUsbDevice::Completed, &submission,
+                                  0);
         if (transfer.endpoint == Protocol::InterruptInEndpoint) {
-            submission->transfer->type = LIBUSB_TRANSFER_TYPE_INTERRUPT;
+            target->type = LIBUSB_TRANSFER_TYPE_INTERRUPT;
         }
     }
+}
 
+ErrorCode LibUsbDevice::Submit(Transfer& transfer) {
     const std::lock_guard lock(mutex_);
-    running_.reserve(running_.size() + 1);
-    spare_.reserve(spare_.size() + running_.size() + 1);
-    const int result = libusb_submit_transfer(submission->transfer);
-    if (result != LIBUSB_SUCCESS) {
-        spare_.push_back(std::move(submission));
-        return ErrorFromLibUsb(result);
+    Submission& submission = FreeSubmission();
+    Fill(submission, transfer);
+    submission.owner = &transfer;
+    const int result = libusb_submit_transfer(submission.transfer.get());
+    if (result == LIBUSB_SUCCESS) {
+        transfer.deviceData = &submission;
+        ++running_;
+    } else {
+        submission.owner = nullptr;
     }
-    transfer.deviceData = submission.get();
-    running_.push_back(submission.release());
-    return Errors::Success;
+    return ErrorFromLibUsb(result);
 }
 
 void LibUsbDevice::Cancel(Transfer& transfer) {
     const std::lock_guard lock(mutex_);
     if (auto* submission = static_cast<Submission*>(transfer.deviceData)) {
-        libusb_cancel_transfer(submission->transfer);
+        libusb_cancel_transfer(submission->transfer.get());
         events_->HandleNow();
     }
 }
@@ -228,13 +225,11 @@ void LibUsbDevice::Complete(Submission& submission) {
     {
         const std::lock_guard lock(mutex_);
         transfer.deviceData = nullptr;
-        std::erase(running_, &submission);
-        spare_.push_back(std::unique_ptr<Submission>(&submission));
-        ++completing_;
+        submission.owner = nullptr;
     }
     transfer.client->TransferCompleted(transfer);
     const std::lock_guard lock(mutex_);
-    --completing_;
+    --running_;
     idle_.notify_all();
 }
 
