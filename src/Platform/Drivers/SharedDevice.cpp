@@ -96,26 +96,6 @@ void SharedDevice::Learn(const Usb::Transfer& transfer) {
 ErrorCode SharedDevice::ClearHalt(std::uint8_t endpoint) {
     // Whoever comes second must not pass before the first has cleared the halt, or its transfer stalls again.
     const std::lock_guard holder(setup_);
-    return ClearHaltOf(endpoint);
-}
-
-/// A halt outlives the claim, and whoever comes next knows nothing of it. A device that does not take this
-/// cannot be helped.
-void SharedDevice::ClearHalts() noexcept {
-    for (unsigned number = 1; number < EndpointsOfADirection; ++number) {
-        for (const unsigned direction : {0U, InDirection}) {
-            try {
-                if (!IsGone()) {
-                    ClearHaltOf(static_cast<std::uint8_t>(number | direction));
-                }
-            } catch (...) {
-                return;
-            }
-        }
-    }
-}
-
-ErrorCode SharedDevice::ClearHaltOf(std::uint8_t endpoint) {
     if ((halted_.load(std::memory_order_acquire) & BitOf(endpoint)) == 0) {
         return Errors::Success;
     }
@@ -124,6 +104,19 @@ ErrorCode SharedDevice::ClearHaltOf(std::uint8_t endpoint) {
         halted_.fetch_and(~BitOf(endpoint), std::memory_order_release);
     }
     return code;
+}
+
+/// A halt outlives the claim, and whoever comes next knows nothing of it. A device that does not take this
+/// cannot be helped.
+void SharedDevice::ClearHalts() noexcept try {
+    for (unsigned number = 1; number < EndpointsOfADirection; ++number) {
+        for (const unsigned direction : {0U, InDirection}) {
+            if (!IsGone()) {
+                ClearHalt(static_cast<std::uint8_t>(number | direction));
+            }
+        }
+    }
+} catch (...) {
 }
 
 ErrorCode SharedDevice::Note(ErrorCode code) {

@@ -41,8 +41,6 @@ class SharedDevice final {
 
   private:
     ErrorCode ClearHalt(std::uint8_t endpoint);
-    /// With `setup` held:
-    ErrorCode ClearHaltOf(std::uint8_t endpoint);
     void ClearHalts() noexcept;
     ErrorCode Note(ErrorCode code);
 
