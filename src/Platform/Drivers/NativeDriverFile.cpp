@@ -1,5 +1,6 @@
 #include "Platform/Drivers/NativeDriverFile.h"
 
+#include <array>
 #include <limits>
 #include <utility>
 
@@ -12,18 +13,10 @@ namespace {
 
 namespace Native = Protocol::NativeDriver;
 
-std::uint8_t EndpointOfPipe(std::uint32_t pipe) {
-    switch (pipe) {
-        case Native::ReadPipe:
-            return Protocol::BulkInEndpoint;
-        case Native::WritePipe:
-            return Protocol::BulkOutEndpoint;
-        case Native::InterruptPipe:
-            return Protocol::InterruptInEndpoint;
-        default:
-            return 0;
-    }
-}
+/// By the number of the pipe: the device itself, read, write and interrupt pipe.
+constexpr std::array<std::uint8_t, 4> Endpoints{0, Protocol::BulkInEndpoint, Protocol::BulkOutEndpoint,
+                                                Protocol::InterruptInEndpoint};
+static_assert(Native::ReadPipe == 1 && Native::WritePipe == 2 && Native::InterruptPipe == 3);
 
 Usb::SetupPacket SetupOf(const std::uint8_t* block) {
     const bool in = block[Native::Block::Direction] == Native::DirectionIn;
@@ -44,26 +37,20 @@ std::unique_ptr<NativeDriverFile> NativeDriverFile::Open(std::shared_ptr<SharedD
                                                          std::uint32_t pipeNumber,
                                                          EndpointCanceller& endpointCanceller,
                                                          ErrorCode& error) {
-    error = shared->Claim();
-    if (error != Errors::Success) {
-        return nullptr;
-    }
-    SharedDevice& device = *shared;
-    std::unique_ptr<NativeDriverFile> file;
-    try {
-        file.reset(new NativeDriverFile(std::move(shared), EndpointOfPipe(pipeNumber), endpointCanceller));
-    } catch (...) {
-        device.Unclaim();
-        throw;
-    }
-    if (file->endpoint_ != 0) {
-        error = device.FindEndpoint(file->endpoint_, Errors::FileNotFound);
+    std::unique_ptr<NativeDriverFile> file(
+        new NativeDriverFile(std::move(shared), Endpoints[pipeNumber], endpointCanceller));
+    error = file->Device().Claim();
+    file->isClaimed_ = error == Errors::Success;
+    if (file->isClaimed_ && file->endpoint_ != 0) {
+        error = file->Device().FindEndpoint(file->endpoint_, Errors::FileNotFound);
     }
     return error == Errors::Success ? std::move(file) : nullptr;
 }
 
 NativeDriverFile::~NativeDriverFile() {
-    Device().Unclaim();
+    if (isClaimed_) {
+        Device().Unclaim();
+    }
 }
 
 Decision NativeDriverFile::Move(bool in, Usb::Transfer& transfer) {

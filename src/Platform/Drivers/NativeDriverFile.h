@@ -40,6 +40,7 @@ class NativeDriverFile final : public DriverFile {
     Decision AbortPipe(std::uint16_t endpoint) const;
 
     const std::uint8_t endpoint_;  ///< 0: the device itself
+    bool isClaimed_ = false;       ///< set by `Open`
 };
 
 }  // namespace Varnholt::Platform::Drivers
