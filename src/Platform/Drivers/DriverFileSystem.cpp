@@ -222,20 +222,17 @@ bool DriverFileSystem::CloseFile(Handle file) {
 
 bool DriverFileSystem::Start(std::string_view call, Handle file, const Operation& operation,
                              Overlapped& record) {
-    const std::shared_ptr<OpenFile> open = Find(file);
-    ErrorCode error = Errors::Success;
     if (CallMustFail(call)) {
-        error = LastError();
-    } else if (open == nullptr) {
-        error = Errors::InvalidHandle;
-    } else if (operation.data == nullptr && operation.length > 0) {
-        error = Errors::InvalidParameter;
-    } else {
-        return open->Start(operation, record);
+        return RefuseStart(record, LastError());
     }
-    MarkNotStarted(record, error);
-    SetLastError(error);
-    return false;
+    const std::shared_ptr<OpenFile> open = Find(file);
+    if (!open) {
+        return RefuseStart(record, Errors::InvalidHandle);
+    }
+    if (operation.data == nullptr && operation.length > 0) {
+        return RefuseStart(record, Errors::InvalidParameter);
+    }
+    return open->Start(operation, record);
 }
 
 bool DriverFileSystem::StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) {

@@ -24,12 +24,6 @@ Decision Decide(DriverFile& driver, const Operation& operation, Usb::Transfer& t
     }
 }
 
-bool NotStarted(Overlapped& record, ErrorCode code) {
-    MarkNotStarted(record, code);
-    SetLastError(code);
-    return false;
-}
-
 }  // namespace
 
 void RunningRequest::TransferCompleted(Usb::Transfer&) noexcept {
@@ -74,12 +68,12 @@ bool OpenFile::Start(const Operation& operation, Overlapped& record) {
     ErrorCode error = Errors::Success;
     const std::shared_ptr<RunningRequest> request = Begin(record, error);
     if (!request) {
-        return NotStarted(record, error);
+        return RefuseStart(record, error);
     }
     const Decision decision = Decide(*driver_, operation, request->transfer);
     if (decision.kind == Decision::Kind::Refused) {
         Retire(*request);
-        return NotStarted(record, decision.code);
+        return RefuseStart(record, decision.code);
     }
     request->endpoint.store(request->transfer.endpoint, std::memory_order_relaxed);
     if (decision.kind == Decision::Kind::Done) {
@@ -96,7 +90,7 @@ bool OpenFile::Start(const Operation& operation, Overlapped& record) {
     if (refused != Errors::Success) {
         const ErrorCode code = driver_->RefusalOf(refused);
         Retire(*request);
-        return NotStarted(record, code);
+        return RefuseStart(record, code);
     }
     // Once `Submitted` is set, the request can end at any moment.
     std::uint32_t before = 0;

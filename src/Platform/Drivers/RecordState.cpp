@@ -71,9 +71,11 @@ void MarkEnded(Overlapped& record, ErrorCode code, std::uint32_t transferred) {
     StateOf(record).store(code, std::memory_order_release);
 }
 
-void MarkNotStarted(Overlapped& record, ErrorCode code) {
+bool RefuseStart(Overlapped& record, ErrorCode code) {
     record.internalHigh = 0;
     StateOf(record).store(code, std::memory_order_release);
+    SetLastError(code);
+    return false;
 }
 
 }  // namespace Varnholt::Platform::Drivers

@@ -23,7 +23,8 @@ void MarkRunning(Overlapped& record, const std::shared_ptr<CompletionSource>& so
 /// Stores how the request ended and signals the event. The record is not touched afterwards.
 void MarkEnded(Overlapped& record, ErrorCode code, std::uint32_t transferred);
 
-/// The record of a request that was never started: a failure without a signal.
-void MarkNotStarted(Overlapped& record, ErrorCode code);
+/// Marks the record of a request that was not started, a failure without a signal, and returns it as a start
+/// does.
+bool RefuseStart(Overlapped& record, ErrorCode code);
 
 }  // namespace Varnholt::Platform::Drivers
