@@ -53,18 +53,12 @@ bool OverlappedRequest::FetchResult(std::uint32_t& transferred, bool wait) {
         return false;
     }
     const bool succeeded = DeviceFiles().GetResult(file_, record_, transferred, wait);
-    if (succeeded) {
-        state_ = State::Completed;
-        return true;
-    }
-    const ErrorCode code = LastError();
-    if (code == Errors::IoIncomplete) {
+    if (!succeeded && LastError() == Errors::IoIncomplete) {
         transferred = 0;
     } else {
         state_ = State::Completed;
     }
-    SetLastError(code);
-    return false;
+    return succeeded;
 }
 
 std::uint32_t OverlappedRequest::CancelAndWait() {
