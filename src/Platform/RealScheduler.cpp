@@ -22,11 +22,10 @@ EventScheduler::EventId NewEventId() {
 }
 
 RealScheduler::~RealScheduler() {
+    decltype(events_) dropped;  // goes without the lock
     Hold hold(lock_);
-    decltype(events_) dropped;
     dropped.swap(events_);
     WaitForEnd(hold);
-    hold.unlock();
 }
 
 std::uint64_t RealScheduler::Now() {
@@ -40,7 +39,12 @@ EventScheduler::EventId RealScheduler::CallAt(std::uint64_t time, std::function<
     JoinEndedThread(hold);
     const auto place = events_.emplace(std::pair(time, id), std::move(event)).first;
     if (!thread_.joinable()) {
-        StartThread();
+        try {
+            thread_ = startThread_([this] { CallEvents(); });
+            threadRuns_ = true;
+        } catch (const std::exception&) {
+            // Without a thread the events wait for the next call that can have one: late, but not lost.
+        }
     }
     if (place == events_.begin()) {
         changed_.notify_one();
@@ -64,16 +68,6 @@ void RealScheduler::Forget(EventId id) {
     callEnded_.wait(hold, [this, id] { return running_ != id; });
     if (events_.empty() && running_ == 0) {
         WaitForEnd(hold);
-    }
-    hold.unlock();
-}
-
-void RealScheduler::StartThread() {
-    try {
-        thread_ = startThread_([this] { CallEvents(); });
-        threadRuns_ = true;
-    } catch (const std::exception&) {
-        // Without a thread the events wait for the next call that can have one: late, but not lost.
     }
 }
 

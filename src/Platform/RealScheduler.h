@@ -34,7 +34,6 @@ class RealScheduler final : public EventScheduler {
     using Hold = std::unique_lock<std::mutex>;
     void CallEvents();
     void CallNext(Hold& hold);
-    void StartThread();
     void JoinEndedThread(Hold& hold);
     void WaitForEnd(Hold& hold);
 
