@@ -2,8 +2,11 @@
 
 #include <cstdint>
 #include <map>
+#include <new>
 #include <shared_mutex>
+#include <string_view>
 
+#include "Platform/CallFilter.h"
 #include "Platform/Linux/WaitableObject.h"
 
 namespace Varnholt::Platform::Linux {
@@ -34,9 +37,13 @@ class HandleTable final {
     std::uintptr_t last_ = 0;                      // guarded by `lock`
 };
 
-/// Runs what makes an object and its handle. Without memory for them there is none, and `LastError` says so.
+/// Runs what makes an object and its handle, unless the platform call must fail. Without memory for them
+/// there is none, and `LastError` says so.
 template <typename Make>
-Handle HandleOf(Make make) {
+Handle HandleOf(std::string_view call, Make make) {
+    if (CallMustFail(call)) {
+        return NoHandle;
+    }
     try {
         return make();
     } catch (const std::bad_alloc&) {

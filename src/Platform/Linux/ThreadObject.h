@@ -25,8 +25,8 @@ class ThreadObject final : public WaitableObject {
 
     pthread_t thread{};
     std::uint32_t number = 0;
-    /// Whether there is a thread of the system behind the object; of its maker.
-    void MustBeJoined(bool exists) { joined_ = !exists; }
+    /// There is a thread of the system behind the object. Of its maker, before others know of it.
+    void MustBeJoined() { joined_ = false; }
 
   private:
     void JoinOnce();

@@ -59,14 +59,12 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
         DispatcherLock hold;
         CurrentClock().ThreadMade(hold, record);
     }
-    object->MustBeJoined(true);
     bool isRunning = false;
     {
         const HostSignalsBlocked blocked;
         isRunning = pthread_create(&object->thread, nullptr, RunThread, start.get()) == 0;
     }
     if (!isRunning) {
-        object->MustBeJoined(false);
         {
             DispatcherLock hold;
             CurrentClock().ThreadNeverBegan(hold, record);
@@ -75,6 +73,7 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
         SetLastError(Errors::NotEnoughMemory);
         return NoHandle;
     }
+    object->MustBeJoined();
     static_cast<void>(start.release());  // the thread's now
     DispatcherLock hold;
     CurrentClock().Preempt(hold);
@@ -84,10 +83,7 @@ Handle StartMadeThread(ThreadEntry entry, void* argument) {
 }  // namespace
 
 Handle StartThread(ThreadEntry entry, void* argument) {
-    if (CallMustFail("StartThread")) {
-        return NoHandle;
-    }
-    return HandleOf([=] { return StartMadeThread(entry, argument); });
+    return HandleOf("StartThread", [=] { return StartMadeThread(entry, argument); });
 }
 
 bool EndThreadByForce(Handle thread, std::uint32_t /*exitCode*/) {

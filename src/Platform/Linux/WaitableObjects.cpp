@@ -1,6 +1,5 @@
 #include "Platform/WaitableObjects.h"
 
-#include <algorithm>
 #include <array>
 #include <new>
 
@@ -70,10 +69,7 @@ WaitAnyResult WaitForObjects(std::span<WaitEntry> entries, std::uint32_t timeout
 }  // namespace
 
 Handle MakeAutoResetEvent() {
-    if (CallMustFail("MakeAutoResetEvent")) {
-        return NoHandle;
-    }
-    return HandleOf([] { return AddIfMade(std::make_shared<EventObject>()); });
+    return HandleOf("MakeAutoResetEvent", [] { return AddIfMade(std::make_shared<EventObject>()); });
 }
 
 bool SignalEvent(Handle event) {
@@ -89,11 +85,9 @@ void ResetEvent(Handle event, const std::shared_ptr<CompletionSource>& source) {
 }
 
 Handle MakeMutex(const std::string& name) {
-    if (CallMustFail("MakeMutex")) {
-        return NoHandle;
-    }
-    return HandleOf(
-        [&] { return AddIfMade(name.empty() ? std::make_shared<MutexObject>() : OpenNamedMutex(name)); });
+    return HandleOf("MakeMutex", [&] {
+        return AddIfMade(name.empty() ? std::make_shared<MutexObject>() : OpenNamedMutex(name));
+    });
 }
 
 bool ReleaseMutex(Handle mutex) {
@@ -102,14 +96,11 @@ bool ReleaseMutex(Handle mutex) {
 }
 
 Handle MakeSemaphore(std::int32_t initialCount, std::int32_t maximumCount, const std::string& name) {
-    if (CallMustFail("MakeSemaphore")) {
-        return NoHandle;
-    }
-    if (initialCount < 0 || maximumCount <= 0 || initialCount > maximumCount) {
-        SetLastError(Errors::InvalidParameter);
-        return NoHandle;
-    }
-    return HandleOf([&] {
+    return HandleOf("MakeSemaphore", [&] {
+        if (initialCount < 0 || maximumCount <= 0 || initialCount > maximumCount) {
+            SetLastError(Errors::InvalidParameter);
+            return NoHandle;
+        }
         return AddIfMade(name.empty() ? std::make_shared<LocalSemaphore>(initialCount, maximumCount)
                                       : OpenNamedSemaphore(initialCount, maximumCount, name));
     });
