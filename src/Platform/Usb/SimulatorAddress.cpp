@@ -6,7 +6,6 @@
 
 #include <algorithm>
 #include <cstddef>
-#include <cstring>
 #include <string_view>
 #include <utility>
 
@@ -15,28 +14,19 @@
 namespace Varnholt::Platform::Usb {
 namespace {
 
-class Address final {
-  public:
-    explicit Address(const std::string& name) {
-        // A leading zero makes the name an abstract one, which is as long as the address says.
-        const std::string path = SimulatorSocketPrefix + name;
-        address_.sun_family = AF_UNIX;
-        std::copy_n(path.begin(), std::min(path.size(), sizeof(address_.sun_path) - 1),
-                    address_.sun_path + 1);
-        size_ = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + 1 + path.size());
-    }
-
-    Linux::FileDescriptor MakeSocket(int (*use)(int, const sockaddr*, socklen_t)) const {
-        // Never waits: a connection is there at once, or the simulator has stopped taking them.
-        Linux::FileDescriptor file(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-        const bool isUsed = file && use(file.Get(), reinterpret_cast<const sockaddr*>(&address_), size_) == 0;
-        return isUsed ? std::move(file) : Linux::FileDescriptor();
-    }
-
-  private:
-    sockaddr_un address_{};
-    socklen_t size_ = 0;
-};
+/// A socket that `bind` or `connect` has put to use; none, with the reason in `errno`, on failure.
+Linux::FileDescriptor MakeSocket(const std::string& name, int (*use)(int, const sockaddr*, socklen_t)) {
+    // A leading zero makes the name an abstract one, which is as long as the address says.
+    const std::string path = '\0' + (SimulatorSocketPrefix + name);
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    std::copy_n(path.begin(), std::min(path.size(), sizeof address.sun_path), address.sun_path);
+    const auto size = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + path.size());
+    // Never waits: a connection is there at once, or the simulator has stopped taking them.
+    Linux::FileDescriptor file(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    const bool isUsed = file && use(file.Get(), reinterpret_cast<const sockaddr*>(&address), size) == 0;
+    return isUsed ? std::move(file) : Linux::FileDescriptor();
+}
 
 }  // namespace
 
@@ -60,14 +50,14 @@ bool IsTrustedUser(std::uint32_t userId) {
 }
 
 int ListenAsSimulator(const std::string& name) {
-    Linux::FileDescriptor file = Address(name).MakeSocket(bind);
+    Linux::FileDescriptor file = MakeSocket(name, bind);
     // Beyond them a connection fails, so these are more than come while the simulator is busy.
     constexpr int waitingConnections = 256;
     return file && listen(file.Get(), waitingConnections) == 0 ? file.Release() : -1;
 }
 
 int ConnectToSimulator(const std::string& name) {
-    return Address(name).MakeSocket(connect).Release();
+    return MakeSocket(name, connect).Release();
 }
 
 }  // namespace Varnholt::Platform::Usb

@@ -2,7 +2,6 @@
 
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <fstream>
 #include <optional>
@@ -66,20 +65,17 @@ std::optional<Connection> Connect(const std::string& name) {
     return connection;
 }
 
-/// For the USB/IP client.
-int ConnectToUsable(const std::string& name, ErrorCode& error) {
-    auto connection = Connect(name);
-    if (connection && connection->usable) {
-        error = Errors::Success;
-        return connection->file.Release();
-    }
-    const bool isDenied = connection || Linux::CodeOf(errno) == Errors::AccessDenied;
-    error = isDenied ? Errors::AccessDenied : Errors::DeviceNotConnected;
-    return -1;
-}
-
 UsbIpConnector ConnectorTo(const std::string& name) {
-    return [name](ErrorCode& error) { return ConnectToUsable(name, error); };
+    return [name](ErrorCode& error) {
+        auto connection = Connect(name);
+        if (connection && connection->usable) {
+            error = Errors::Success;
+            return connection->file.Release();
+        }
+        const bool isDenied = connection || Linux::CodeOf(errno) == Errors::AccessDenied;
+        error = isDenied ? Errors::AccessDenied : Errors::DeviceNotConnected;
+        return -1;
+    };
 }
 
 /// As `Connect`, which it does.
