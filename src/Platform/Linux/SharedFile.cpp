@@ -9,7 +9,6 @@
 #include <cerrno>
 #include <cstdint>
 #include <cstdio>
-#include <string_view>
 #include <utility>
 
 #include "Platform/ErrorCodes.h"
