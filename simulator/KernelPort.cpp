@@ -11,6 +11,7 @@
 #include <sstream>
 #include <stdexcept>
 
+#include "Platform/Linux/FileDescriptor.h"
 #include "Platform/Usb/UsbIpProtocol.h"
 
 namespace Varnholt::Simulator {
@@ -62,16 +63,9 @@ unsigned PlugIntoKernel(int connectedSocket, std::uint32_t deviceId, const std::
     const std::string order = std::to_string(*port) + " " + std::to_string(connectedSocket) + " " +
                               std::to_string(deviceId) + " " +
                               std::to_string(Platform::Usb::UsbIp::HighSpeed);
-    const int file = open((folder + "/attach").c_str(), O_WRONLY | O_CLOEXEC);
-    const bool written =
-        file >= 0 && write(file, order.data(), order.size()) == static_cast<ssize_t>(order.size());
-    const int reason = errno;
-    if (file >= 0) {
-        close(file);
-    }
-    if (!written) {
-        throw std::runtime_error("the kernel does not take the device: " +
-                                 std::string(std::strerror(reason)));
+    const Platform::Linux::FileDescriptor file(open((folder + "/attach").c_str(), O_WRONLY | O_CLOEXEC));
+    if (!file || write(file.Get(), order.data(), order.size()) != static_cast<ssize_t>(order.size())) {
+        throw std::runtime_error("the kernel does not take the device: " + std::string(std::strerror(errno)));
     }
     return *port;
 }

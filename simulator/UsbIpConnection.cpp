@@ -2,7 +2,6 @@
 
 #include <poll.h>
 #include <sys/socket.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -19,16 +18,16 @@ constexpr std::uint64_t Patience = 5'000'000;
 
 }  // namespace
 
-UsbIpConnection::UsbIpConnection(PollLoop& pollLoop, int connectedSocket,
+UsbIpConnection::UsbIpConnection(PollLoop& pollLoop, Platform::Linux::FileDescriptor connectedSocket,
                                  std::unique_ptr<UsbIpExports> offered, Over whenOver)
-    : loop_(pollLoop), file_(connectedSocket), exports_(std::move(offered)), over_(std::move(whenOver)) {}
+    : loop_(pollLoop),
+      file_(std::move(connectedSocket)),
+      exports_(std::move(offered)),
+      over_(std::move(whenOver)) {}
 
 UsbIpConnection::~UsbIpConnection() {
     StopListening();
     session_.reset();
-    exports_.reset();
-    // The peer takes this for the sign that the instrument is free again.
-    close(file_);
 }
 
 void UsbIpConnection::Begin() {
@@ -51,7 +50,7 @@ void UsbIpConnection::Watch() {
     }
     if (events != watchedFor_) {
         watchedFor_ = events;
-        loop_.Watch(file_, events, [this] { Ready(); });
+        loop_.Watch(file_.Get(), events, [this] { Ready(); });
     }
     if (deadline_ == 0 && session_->PeerIsDue()) {
         CheckPeerAt(loop_.Now() + Patience);
@@ -84,7 +83,7 @@ void UsbIpConnection::FlushSoon() {
 
 void UsbIpConnection::Ready() {
     if (session_->WantsInput() && inputStart_ == inputEnd_) {
-        const ssize_t count = recv(file_, input_.data(), input_.size(), MSG_DONTWAIT);
+        const ssize_t count = recv(file_.Get(), input_.data(), input_.size(), MSG_DONTWAIT);
         if (count == 0 || (count < 0 && errno != EAGAIN && errno != EINTR)) {
             End();
             return;
@@ -116,7 +115,7 @@ void UsbIpConnection::Flush() {
 bool UsbIpConnection::SendOutput() {
     while (!session_->Output().empty()) {
         const auto output = session_->Output();
-        const ssize_t count = send(file_, output.data(), output.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
+        const ssize_t count = send(file_.Get(), output.data(), output.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
         if (count < 0 && errno != EINTR) {
             return errno == EAGAIN;
         }
@@ -130,7 +129,7 @@ void UsbIpConnection::StopListening() {
     ended_ = true;
     loop_.Forget(flush_);
     loop_.Forget(deadline_);
-    loop_.Unwatch(file_);
+    loop_.Unwatch(file_.Get());
 }
 
 void UsbIpConnection::End(const std::string& complaint) {

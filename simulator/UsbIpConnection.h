@@ -7,6 +7,7 @@
 #include <memory>
 #include <string>
 
+#include "Platform/Linux/FileDescriptor.h"
 #include "PollLoop.h"
 #include "UsbIpSession.h"
 
@@ -19,9 +20,9 @@ class UsbIpConnection final {
     /// the connection's own functions: it is to be destroyed later.
     using Over = std::function<void(UsbIpConnection& connection, const std::string& complaint)>;
 
-    /// Owns the socket, which does not block, and what the peer can import. The loop must outlive it.
-    UsbIpConnection(PollLoop& pollLoop, int connectedSocket, std::unique_ptr<UsbIpExports> offered,
-                    Over whenOver);
+    /// The socket does not block; `offered` is what the peer can import. The loop must outlive it.
+    UsbIpConnection(PollLoop& pollLoop, Platform::Linux::FileDescriptor connectedSocket,
+                    std::unique_ptr<UsbIpExports> offered, Over whenOver);
     ~UsbIpConnection();
     UsbIpConnection(const UsbIpConnection&) = delete;
     UsbIpConnection& operator=(const UsbIpConnection&) = delete;
@@ -42,7 +43,8 @@ class UsbIpConnection final {
     void End(const std::string& complaint = {});
 
     PollLoop& loop_;
-    const int file_;
+    /// Closed last: the peer takes that for the sign that the instrument is free again.
+    const Platform::Linux::FileDescriptor file_;
     std::unique_ptr<UsbIpExports> exports_;
     const Over over_;
     std::unique_ptr<UsbIpSession> session_;

@@ -6,7 +6,6 @@
 #include <netinet/tcp.h>
 #include <poll.h>
 #include <sys/socket.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -24,6 +23,7 @@ namespace Varnholt::Simulator {
 
 namespace UsbIp = Platform::Usb::UsbIp;
 namespace Errors = Platform::Errors;
+using Platform::Linux::FileDescriptor;
 using Platform::Usb::UsbDevice;
 
 namespace {
@@ -147,8 +147,7 @@ UsbIpServer::~UsbIpServer() {
     removed_.clear();
     connections_.clear();
     for (const Listener& listener : listeners_) {
-        loop_.Unwatch(listener.file);
-        close(listener.file);
+        loop_.Unwatch(listener.file.Get());
     }
 }
 
@@ -163,27 +162,27 @@ void UsbIpServer::Add(Export added) {
         throw std::runtime_error("\"" + added.name +
                                  "\" is no name: letters, digits, '-', '_' and '.', at most 64 of them");
     }
-    const int file = Platform::Usb::ListenAsSimulator(added.name);
-    if (file < 0 && errno == EADDRINUSE) {
+    FileDescriptor file(Platform::Usb::ListenAsSimulator(added.name));
+    if (!file && errno == EADDRINUSE) {
         throw std::runtime_error("an instrument named \"" + added.name +
                                  "\" is already simulated; choose another --name");
     }
-    if (file < 0) {
+    if (!file) {
         Fail("cannot listen for \"" + added.name + "\"");
     }
     Exported& exported = exportedInstruments_.emplace_back();
     static_cast<Export&>(exported) = std::move(added);
     exported.number = static_cast<std::uint32_t>(exportedInstruments_.size());
-    ListenTo(file, {&exported}, true);
+    ListenTo(std::move(file), {&exported}, true);
 }
 
 std::uint16_t UsbIpServer::ListenTcp(std::uint16_t port) {
-    const int file = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    if (file < 0) {
+    FileDescriptor file(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    if (!file) {
         Fail("no TCP socket");
     }
     const int on = 1;
-    setsockopt(file, SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
+    setsockopt(file.Get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
     sockaddr_in address{};
     address.sin_family = AF_INET;
     address.sin_port = htons(port);
@@ -191,18 +190,15 @@ std::uint16_t UsbIpServer::ListenTcp(std::uint16_t port) {
     socklen_t size = sizeof address;
     auto* const generic = reinterpret_cast<sockaddr*>(&address);
     constexpr int waitingConnections = 16;
-    if (bind(file, generic, size) != 0 || listen(file, waitingConnections) != 0 ||
-        getsockname(file, generic, &size) != 0) {
-        const int error = errno;
-        close(file);
-        errno = error;
+    if (bind(file.Get(), generic, size) != 0 || listen(file.Get(), waitingConnections) != 0 ||
+        getsockname(file.Get(), generic, &size) != 0) {
         Fail("cannot listen on TCP port " + std::to_string(port));
     }
     std::vector<Exported*> all;
     for (Exported& each : exportedInstruments_) {
         all.push_back(&each);
     }
-    ListenTo(file, std::move(all), false);
+    ListenTo(std::move(file), std::move(all), false);
     return ntohs(address.sin_port);
 }
 
@@ -219,22 +215,22 @@ UsbIp::DeviceRecord UsbIpServer::Record(const std::string& name) {
     return exported.Record(exported.BusId());
 }
 
-void UsbIpServer::ListenTo(int file, std::vector<Exported*> offered, bool unixSocket) {
-    fcntl(file, F_SETFL, O_NONBLOCK);
-    listeners_.push_back({file, unixSocket, std::move(offered)});
+void UsbIpServer::ListenTo(FileDescriptor file, std::vector<Exported*> offered, bool unixSocket) {
+    fcntl(file.Get(), F_SETFL, O_NONBLOCK);
+    listeners_.push_back({std::move(file), unixSocket, std::move(offered)});
     Listen();
 }
 
 void UsbIpServer::Listen() {
     for (const Listener& listener : listeners_) {
-        loop_.Watch(listener.file, POLLIN, [this, &listener] { Accept(listener); });
+        loop_.Watch(listener.file.Get(), POLLIN, [this, &listener] { Accept(listener); });
     }
 }
 
 void UsbIpServer::PauseListening() {
     constexpr std::uint64_t pause = 100'000;
     for (const Listener& listener : listeners_) {
-        loop_.Unwatch(listener.file);
+        loop_.Unwatch(listener.file.Get());
     }
     loop_.Forget(relistening_);
     relistening_ = loop_.CallAt(loop_.Now() + pause, [this] { Listen(); });
@@ -242,8 +238,8 @@ void UsbIpServer::PauseListening() {
 
 void UsbIpServer::Accept(const Listener& listener) {
     constexpr std::size_t mostConnections = 256;
-    const int file = accept4(listener.file, nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK);
-    if (file < 0) {
+    FileDescriptor file(accept4(listener.file.Get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+    if (!file) {
         if (errno != EAGAIN && errno != EINTR && errno != ECONNABORTED) {
             PauseListening();  // no file is left: one may be later
         }
@@ -251,37 +247,35 @@ void UsbIpServer::Accept(const Listener& listener) {
     }
     std::string peer = "a TCP peer";
     if (listener.unixSocket) {
-        const auto credentials = Platform::Usb::CredentialsOfPeer(file);
+        const auto credentials = Platform::Usb::CredentialsOfPeer(file.Get());
         if (!credentials || !Platform::Usb::IsTrustedUser(credentials->userId)) {
             Tell("refused a process of another user");
-            close(file);
             return;
         }
         peer = DescribeProcess(credentials->processId);
     } else {
         const int on = 1;
-        setsockopt(file, IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
+        setsockopt(file.Get(), IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
     }
-    if (connections_.size() >= mostConnections) {
-        close(file);
-        return;
+    if (connections_.size() < mostConnections) {
+        Connect(std::move(file),
+                std::make_unique<Exports>(*this, listener.offered, peer, !listener.unixSocket), peer)
+            .Begin();
     }
-    Connect(file, std::make_unique<Exports>(*this, listener.offered, peer, !listener.unixSocket), peer)
-        .Begin();
 }
 
-void UsbIpServer::Serve(int connectedSocket, const std::string& name, const std::string& peer) {
+void UsbIpServer::Serve(FileDescriptor connectedSocket, const std::string& name, const std::string& peer) {
     auto exports = std::make_unique<Exports>(*this, std::vector<Exported*>(), peer, false);
     const std::shared_ptr<UsbDevice> device = exports->Take(Find(name)).device;
     if (!device) {
-        close(connectedSocket);
         throw std::runtime_error("\"" + name + "\" is in use");
     }
-    fcntl(connectedSocket, F_SETFL, O_NONBLOCK);
-    Connect(connectedSocket, std::move(exports), peer).BeginWith(device);
+    fcntl(connectedSocket.Get(), F_SETFL, O_NONBLOCK);
+    Connect(std::move(connectedSocket), std::move(exports), peer).BeginWith(device);
 }
 
-UsbIpConnection& UsbIpServer::Connect(int file, std::unique_ptr<Exports> exports, const std::string& peer) {
+UsbIpConnection& UsbIpServer::Connect(FileDescriptor file, std::unique_ptr<Exports> exports,
+                                      const std::string& peer) {
     const auto over = [this, peer](UsbIpConnection& connection, const std::string& complaint) {
         if (!complaint.empty()) {
             Tell(peer + ": " + complaint);
@@ -289,7 +283,7 @@ UsbIpConnection& UsbIpServer::Connect(int file, std::unique_ptr<Exports> exports
         Remove(connection);
     };
     return *connections_.emplace_back(
-        std::make_unique<UsbIpConnection>(loop_, file, std::move(exports), over));
+        std::make_unique<UsbIpConnection>(loop_, std::move(file), std::move(exports), over));
 }
 
 void UsbIpServer::Remove(UsbIpConnection& connection) {

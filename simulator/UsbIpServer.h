@@ -40,9 +40,10 @@ class UsbIpServer final {
     /// Listens on 127.0.0.1; 0 takes a free port. Answers the port. Throws as above.
     std::uint16_t ListenTcp(std::uint16_t port);
 
-    /// Serves a connected stream socket whose peer has nothing to import any more, such as a kernel. The
-    /// socket is the server's from then on; `peer` says who is there. Throws as above.
-    void Serve(int connectedSocket, const std::string& name, const std::string& peer);
+    /// Serves a connected stream socket whose peer has nothing to import any more, such as a kernel; `peer`
+    /// says who is there. Throws as above.
+    void Serve(Platform::Linux::FileDescriptor connectedSocket, const std::string& name,
+               const std::string& peer);
 
     /// How TCP peers find an instrument, and its device number.
     Platform::Usb::UsbIp::DeviceRecord Record(const std::string& name);
@@ -52,18 +53,19 @@ class UsbIpServer final {
     class Exports;
 
     struct Listener {
-        int file;
+        Platform::Linux::FileDescriptor file;
         bool unixSocket;
         std::vector<Exported*> offered;
     };
 
-    void ListenTo(int file, std::vector<Exported*> offered, bool unixSocket);
+    void ListenTo(Platform::Linux::FileDescriptor file, std::vector<Exported*> offered, bool unixSocket);
     Exported& Find(const std::string& name);
     void Listen();
     void PauseListening();
     void Accept(const Listener& listener);
     /// Adds a connection, which has yet to begin.
-    UsbIpConnection& Connect(int file, std::unique_ptr<Exports> exports, const std::string& peer);
+    UsbIpConnection& Connect(Platform::Linux::FileDescriptor file, std::unique_ptr<Exports> exports,
+                             const std::string& peer);
     /// Ends a connection as soon as what is being called has returned: it may be one of its own functions.
     void Remove(UsbIpConnection& connection);
     void Tell(const std::string& line) const;

@@ -2,7 +2,6 @@
 #include <poll.h>
 #include <sys/signalfd.h>
 #include <sys/socket.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <csignal>
@@ -21,6 +20,7 @@
 #include "FaultPlan.h"
 #include "FreshEeprom.h"
 #include "KernelPort.h"
+#include "Platform/Linux/FileDescriptor.h"
 #include "Platform/Linux/StandardStreams.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/SimulatorBus.h"
@@ -34,6 +34,7 @@ namespace {
 using namespace Varnholt::Simulator;
 namespace Protocol = Varnholt::Protocol;
 namespace Usb = Varnholt::Platform::Usb;
+using Varnholt::Platform::Linux::FileDescriptor;
 
 InstrumentSettings MakeSettings(const ProgramOptions& options, std::size_t index) {
     InstrumentSettings settings = SettingsOfNumber(index);
@@ -51,31 +52,26 @@ InstrumentSettings MakeSettings(const ProgramOptions& options, std::size_t index
 }
 
 /// SIGINT and SIGTERM, as a file to watch.
-int BlockedStopSignals() {
+FileDescriptor BlockedStopSignals() {
     sigset_t signals;
     sigemptyset(&signals);
     sigaddset(&signals, SIGINT);
     sigaddset(&signals, SIGTERM);
     sigprocmask(SIG_BLOCK, &signals, nullptr);
-    return signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK);
+    return FileDescriptor(signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK));
 }
 
 /// Plugs an instrument into the kernel, by a socket whose other end, which is answered, is to be served.
-int Attach(UsbIpServer& server, const std::string& name) {
+FileDescriptor Attach(UsbIpServer& server, const std::string& name) {
     int ends[2] = {-1, -1};
     if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
         throw std::runtime_error("no socket for the kernel");
     }
-    try {
-        const unsigned port = PlugIntoKernel(ends[1], server.Record(name).DeviceId());
-        std::cout << "ready: plugged into port " << port << " of the kernel  (" << name << ")\n";
-    } catch (...) {
-        close(ends[0]);
-        close(ends[1]);
-        throw;
-    }
-    close(ends[1]);
-    return ends[0];
+    FileDescriptor served(ends[0]);
+    const FileDescriptor ofKernel(ends[1]);
+    const unsigned port = PlugIntoKernel(ofKernel.Get(), server.Record(name).DeviceId());
+    std::cout << "ready: plugged into port " << port << " of the kernel  (" << name << ")\n";
+    return served;
 }
 
 void Complain(const std::string& line) {
@@ -102,7 +98,7 @@ class Instruments final {
     /// Makes them reachable, and says how.
     void Offer() {
         const std::uint16_t port = options_.tcpPort ? server_.ListenTcp(*options_.tcpPort) : 0;
-        std::vector<int> kernelSockets;
+        std::vector<FileDescriptor> kernelSockets;
         for (std::size_t i = 0; options_.attach && i < names_.size(); ++i) {
             kernelSockets.push_back(Attach(server_, names_[i]));
         }
@@ -113,7 +109,7 @@ class Instruments final {
             }
         }
         for (std::size_t i = 0; i < kernelSockets.size(); ++i) {
-            server_.Serve(kernelSockets[i], names_[i], Usb::KernelAsUser);
+            server_.Serve(std::move(kernelSockets[i]), names_[i], Usb::KernelAsUser);
         }
         for (std::size_t i = 0; options_.tcpPort && i < names_.size(); ++i) {
             std::cout << "ready: usbip --tcp-port " << port << " attach -r 127.0.0.1 -b "
@@ -172,15 +168,13 @@ class Instruments final {
 void Run(const ProgramOptions& options) {
     PollLoop loop;
     Instruments instruments(loop, options);
-    const int stopSignals = BlockedStopSignals();  // who reads "ready" may send one at once
+    const FileDescriptor stopSignals = BlockedStopSignals();  // who reads "ready" may send one at once
     instruments.Offer();
-    loop.Watch(stopSignals, POLLIN, [&loop] { loop.Stop(); });
+    loop.Watch(stopSignals.Get(), POLLIN, [&loop] { loop.Stop(); });
     if (options.seconds > 0) {
         loop.CallAt(loop.Now() + static_cast<std::uint64_t>(options.seconds * 1e6), [&loop] { loop.Stop(); });
     }
     loop.Run();
-    loop.Unwatch(stopSignals);
-    close(stopSignals);
     instruments.Finish();
 }
 

@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <system_error>
 
+#include "Platform/Linux/FileDescriptor.h"
 #include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Utilities::Files {
@@ -16,18 +17,15 @@ class Descriptor final : public ByteSource {
   public:
     Descriptor(int openDescriptor, std::string name)
         : descriptor_(openDescriptor), shownName_(std::move(name)) {
-        if (descriptor_ < 0) {
+        if (!descriptor_) {
             Fail();
         }
     }
-    ~Descriptor() override { ::close(descriptor_); }
-    Descriptor(const Descriptor&) = delete;
-    Descriptor& operator=(const Descriptor&) = delete;
 
-    bool IsTerminal() const override { return ::isatty(descriptor_) != 0; }
+    bool IsTerminal() const override { return ::isatty(descriptor_.Get()) != 0; }
 
     bool Wait(std::uint32_t milliseconds) override {
-        pollfd watched{descriptor_, POLLIN, 0};
+        pollfd watched{descriptor_.Get(), POLLIN, 0};
         const int found = ::poll(&watched, 1, static_cast<int>(milliseconds));
         if (found < 0 && errno != EINTR) {
             Fail();
@@ -36,7 +34,7 @@ class Descriptor final : public ByteSource {
     }
 
     std::size_t Read(std::uint8_t* buffer, std::size_t size) override {
-        const ssize_t count = ::read(descriptor_, buffer, size);
+        const ssize_t count = ::read(descriptor_.Get(), buffer, size);
         if (count < 0) {
             Fail();
         }
@@ -48,7 +46,7 @@ class Descriptor final : public ByteSource {
         throw FileError("cannot read " + shownName_ + ": " + std::generic_category().message(errno));
     }
 
-    const int descriptor_;
+    const Platform::Linux::FileDescriptor descriptor_;
     const std::string shownName_;
 };
 

@@ -3,16 +3,13 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include "Platform/Linux/FileDescriptor.h"
+
 namespace Varnholt::Utilities::Files {
 
 bool SyncToDisk(const std::string& path) {
-    const int file = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
-    if (file < 0) {
-        return false;
-    }
-    const bool synced = ::fsync(file) == 0;
-    ::close(file);
-    return synced;
+    const Platform::Linux::FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    return file && ::fsync(file.Get()) == 0;
 }
 
 }  // namespace Varnholt::Utilities::Files
