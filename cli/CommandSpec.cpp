@@ -4,6 +4,7 @@
 
 #include <charconv>
 #include <CLI/CLI.hpp>
+#include <concepts>
 #include <limits>
 #include <utility>
 
@@ -12,21 +13,20 @@
 namespace Varnholt::Cli {
 namespace {
 
-/// The option's numbers are read as all numbers of a command line: the parser itself would take a leading
-/// zero for octal.
+/// Numbers are read as all numbers of a command line: the parser itself would take a leading zero for octal.
 template <class Integer>
-CLI::Option* OfIntegers(CLI::Option* option) {
-    return option->transform(CLI::Validator(
+CLI::Validator WholeNumber() {
+    return CLI::Validator(
         [](std::string& text) -> std::string {
+            const auto most = std::numeric_limits<Integer>::max();
             std::uint64_t number = 0;
-            if (!Service::ParseNumber(text, std::numeric_limits<Integer>::max(), number)) {
-                return fmt::format("'{}' is no whole number up to {}", text,
-                                   std::numeric_limits<Integer>::max());
+            if (!Service::ParseNumber(text, most, number)) {
+                return fmt::format("'{}' is no whole number up to {}", text, most);
             }
             text = std::to_string(number);
             return {};
         },
-        ""));
+        "");
 }
 
 }  // namespace
@@ -88,39 +88,29 @@ CommandSpec CommandSpec::AddGroup(const char* name, const char* about) {
 }
 
 template <class Target>
-CLI::Option* CommandSpec::AddOption(const char* names, Target& target, const char* about) {
+OptionSpec CommandSpec::Add(const char* names, Target& target, const char* about) {
     CLI::Option* const option = command_->add_option(names, target, about);
     if (option->get_positional() && option->get_lnames().empty()) {
         option->type_name("");  // its name says what it is
     }
-    return option;
+    OptionSpec spec(option);
+    if constexpr (std::same_as<Target, std::string>) {
+        spec.Check([](const std::string& text) { return std::string(text.empty() ? "is empty" : ""); });
+    } else if constexpr (std::same_as<Target, std::uint32_t>) {
+        option->transform(WholeNumber<std::uint32_t>());
+    } else if constexpr (std::same_as<Target, std::uint16_t> ||
+                         std::same_as<Target, std::vector<std::uint16_t>>) {
+        option->transform(WholeNumber<std::uint16_t>());
+    }
+    return spec;
 }
 
-OptionSpec CommandSpec::Add(const char* names, std::string& target, const char* about) {
-    return OptionSpec(AddOption(names, target, about)).Check([](const std::string& text) {
-        return std::string(text.empty() ? "is empty" : "");
-    });
-}
-
-OptionSpec CommandSpec::Add(const char* names, double& target, const char* about) {
-    return OptionSpec(AddOption(names, target, about));
-}
-
-OptionSpec CommandSpec::Add(const char* names, std::uint16_t& target, const char* about) {
-    return OptionSpec(OfIntegers<std::uint16_t>(AddOption(names, target, about)));
-}
-
-OptionSpec CommandSpec::Add(const char* names, std::uint32_t& target, const char* about) {
-    return OptionSpec(OfIntegers<std::uint32_t>(AddOption(names, target, about)));
-}
-
-OptionSpec CommandSpec::Add(const char* names, std::vector<std::string>& target, const char* about) {
-    return OptionSpec(AddOption(names, target, about));
-}
-
-OptionSpec CommandSpec::Add(const char* names, std::vector<std::uint16_t>& target, const char* about) {
-    return OptionSpec(OfIntegers<std::uint16_t>(AddOption(names, target, about)));
-}
+template OptionSpec CommandSpec::Add(const char*, std::string&, const char*);
+template OptionSpec CommandSpec::Add(const char*, double&, const char*);
+template OptionSpec CommandSpec::Add(const char*, std::uint16_t&, const char*);
+template OptionSpec CommandSpec::Add(const char*, std::uint32_t&, const char*);
+template OptionSpec CommandSpec::Add(const char*, std::vector<std::string>&, const char*);
+template OptionSpec CommandSpec::Add(const char*, std::vector<std::uint16_t>&, const char*);
 
 OptionSpec CommandSpec::AddFlag(const char* names, bool& target, const char* about) {
     return OptionSpec(command_->add_flag(names, target, about));

@@ -44,12 +44,10 @@ class CommandSpec final {
     /// A group: one of its commands must be named.
     CommandSpec AddGroup(const char* name, const char* about);
 
-    OptionSpec Add(const char* names, std::string& target, const char* about);
-    OptionSpec Add(const char* names, double& target, const char* about);
-    OptionSpec Add(const char* names, std::uint16_t& target, const char* about);
-    OptionSpec Add(const char* names, std::uint32_t& target, const char* about);
-    OptionSpec Add(const char* names, std::vector<std::string>& target, const char* about);
-    OptionSpec Add(const char* names, std::vector<std::uint16_t>& target, const char* about);
+    /// For a `std::string`, a `double`, an unsigned integer of 16 or 32 bits, or several texts or 16-bit
+    /// integers.
+    template <class Target>
+    OptionSpec Add(const char* names, Target& target, const char* about);
     OptionSpec AddFlag(const char* names, bool& target, const char* about);
 
     /// Text behind the options.
@@ -58,9 +56,6 @@ class CommandSpec final {
     void WhenChosen(std::function<void()> call);
 
   private:
-    template <class Target>
-    CLI::Option* AddOption(const char* names, Target& target, const char* about);
-
     CLI::App* command_;
 };
 
