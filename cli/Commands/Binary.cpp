@@ -50,18 +50,15 @@ void PutBinary(Session& session, const PutBinaryOptions& options) {
 void AddBinary(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("binary", "read and write the binary block of 1904 bytes");
 
-    const auto get = std::make_shared<GetBinaryOptions>();
-    CommandSpec command = group.AddCommand("get", "save the binary block in a file");
-    AddNewFileOptions(command, "FILE", get->file);
-    AddMemoryOptions(command, get->memory);
-    SetAction(command, session, get, GetBinary);
+    auto [get, getOptions] = NewCommand(group, session, "get", "save the binary block in a file", GetBinary);
+    AddNewFileOptions(get, "FILE", getOptions.file);
+    AddMemoryOptions(get, getOptions.memory);
 
-    const auto put = std::make_shared<PutBinaryOptions>();
-    command = group.AddCommand("put", "write the binary block from a file");
-    command.Add("FILE", put->file, "1904 bytes; `-` is standard input").Required();
-    AddChangeOptions(command, put->change);
-    AddMemoryOptions(command, put->memory);
-    SetAction(command, session, put, PutBinary);
+    auto [put, putOptions] =
+        NewCommand(group, session, "put", "write the binary block from a file", PutBinary);
+    put.Add("FILE", putOptions.file, "1904 bytes; `-` is standard input").Required();
+    AddChangeOptions(put, putOptions.change);
+    AddMemoryOptions(put, putOptions.memory);
 }
 
 }  // namespace Varnholt::Cli

@@ -51,20 +51,18 @@ void SetCalibration(Session& session, const SetCalibrationOptions& options) {
 void AddCalibration(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("calibration", "show and set calibration values");
 
-    const auto show = std::make_shared<MemoryOptions>();
-    CommandSpec command = group.AddCommand("show", "show the calibration values");
-    AddMemoryOptions(command, *show);
-    SetAction(command, session, show, ShowCalibration);
+    auto [show, showOptions] =
+        NewCommand(group, session, "show", "show the calibration values", ShowCalibration);
+    AddMemoryOptions(show, showOptions);
 
-    const auto set = std::make_shared<SetCalibrationOptions>();
-    command = group.AddCommand(
-        "set",
+    auto [set, setOptions] = NewCommand(
+        group, session, "set",
         "set calibration values: the EEPROM is read, changed as a whole and proven, backed up, written "
-        "where it differs, and read back");
-    command.Add("ID=VALUE", set->assignments, "new values; elements with commas: 1000=0.5,1.5").Required();
-    AddChangeOptions(command, set->change);
-    AddMemoryOptions(command, set->memory);
-    SetAction(command, session, set, SetCalibration);
+        "where it differs, and read back",
+        SetCalibration);
+    set.Add("ID=VALUE", setOptions.assignments, "new values; elements with commas: 1000=0.5,1.5").Required();
+    AddChangeOptions(set, setOptions.change);
+    AddMemoryOptions(set, setOptions.memory);
 }
 
 }  // namespace Varnholt::Cli

@@ -23,13 +23,21 @@ enum class Choice {
 Service::FoundInstrument ChooseInstrument(Session& session, const InstrumentOptions& options,
                                           Choice choice = Choice::FirstWillDo);
 
-/// Makes `run` the session's action when `command` is what the user asked for. The options live as long as
-/// the command line.
+/// A command and its options, which live as long as the command line.
 template <class Options>
-void SetAction(CommandSpec command, Session& session, const std::shared_ptr<Options>& options,
-               void (*run)(Session& session, const Options& options)) {
+struct CommandWithOptions {
+    CommandSpec command;
+    Options& options;
+};
+/// Adds a command. `run`, with the options, is the session's action when it is what the user asked for.
+template <class Options>
+CommandWithOptions<Options> NewCommand(CommandSpec parent, Session& session, const char* name,
+                                       const char* about, void (*run)(Session&, const Options&)) {
+    const auto options = std::make_shared<Options>();
+    CommandSpec command = parent.AddCommand(name, about);
     command.WhenChosen(
         [&session, options, run] { session.action = [&session, options, run] { run(session, *options); }; });
+    return {command, *options};
 }
 
 /// --device and --transport.

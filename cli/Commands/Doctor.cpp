@@ -60,14 +60,13 @@ void Doctor(Session& session, const DoctorOptions& options) {
 }  // namespace
 
 void AddDoctor(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<DoctorOptions>();
-    CommandSpec command =
-        app.AddCommand("doctor", "say why an instrument is not found or cannot be used, and what to do");
+    auto [command, options] =
+        NewCommand(app, session, "doctor",
+                   "say why an instrument is not found or cannot be used, and what to do", Doctor);
     command.Footer("Every instrument that is free is opened, and thereby reset, to see whether it answers.");
-    command.Add("--transport", options->transport, "native or usbio; without it, as the machine prefers")
+    command.Add("--transport", options.transport, "native or usbio; without it, as the machine prefers")
         .OneOf({"native", "usbio"});
-    AddJsonFlag(command, options->json);
-    SetAction(command, session, options, Doctor);
+    AddJsonFlag(command, options.json);
 }
 
 }  // namespace Varnholt::Cli

@@ -88,42 +88,38 @@ void New(Session& session, const BackupOptions& options) {
     }
 }
 
-void AddWriteOptions(CommandSpec command, const std::shared_ptr<WriteOptions>& options, BackupHabit habit) {
-    command.Add("--image,FILE", options->file, "image of 8192 bytes; `-` is standard input")
+void AddWriteOptions(CommandSpec command, WriteOptions& options, BackupHabit habit) {
+    command.Add("--image,FILE", options.file, "image of 8192 bytes; `-` is standard input")
         .Type("FILE")
         .Required();
-    command.AddFlag("--force", options->force, "write an image that the driver cannot use").Group("Change");
-    AddChangeOptions(command, options->change, habit);
-    AddInstrumentOptions(command, options->memory.instrument);
-    AddJsonFlag(command, options->memory.json);
+    command.AddFlag("--force", options.force, "write an image that the driver cannot use").Group("Change");
+    AddChangeOptions(command, options.change, habit);
+    AddInstrumentOptions(command, options.memory.instrument);
+    AddJsonFlag(command, options.memory.json);
 }
 
 }  // namespace
 
 void AddEepromTransfers(CommandSpec group, Session& session) {
-    const auto backup = std::make_shared<BackupOptions>();
-    CommandSpec command = group.AddCommand("backup", "save the EEPROM of an instrument in a file");
-    AddNewFileOptions(command, "--image,FILE", backup->file);
-    AddInstrumentOptions(command, backup->memory.instrument);
-    AddJsonFlag(command, backup->memory.json);
-    SetAction(command, session, backup, Backup);
+    auto [backup, backupOptions] =
+        NewCommand(group, session, "backup", "save the EEPROM of an instrument in a file", Backup);
+    AddNewFileOptions(backup, "--image,FILE", backupOptions.file);
+    AddInstrumentOptions(backup, backupOptions.memory.instrument);
+    AddJsonFlag(backup, backupOptions.memory.json);
 
-    const auto write = std::make_shared<WriteOptions>();
-    command = group.AddCommand(
-        "write", "write an image the safe way: check it, make a backup, write what differs, read it back");
-    AddWriteOptions(command, write, BackupHabit::Always);
-    SetAction(command, session, write, Write);
+    auto [write, writeOptions] = NewCommand(
+        group, session, "write",
+        "write an image the safe way: check it, make a backup, write what differs, read it back", Write);
+    AddWriteOptions(write, writeOptions, BackupHabit::Always);
 
-    const auto restore = std::make_shared<WriteOptions>();
-    command = group.AddCommand("restore", "write a backup back (as `write`, without a new backup)");
-    AddWriteOptions(command, restore, BackupHabit::WhenNamed);
-    SetAction(command, session, restore, Restore);
+    auto [restore, restoreOptions] = NewCommand(
+        group, session, "restore", "write a backup back (as `write`, without a new backup)", Restore);
+    AddWriteOptions(restore, restoreOptions, BackupHabit::WhenNamed);
 
-    const auto fresh = std::make_shared<BackupOptions>();
-    command = group.AddCommand("new", "make the image of a fresh instrument");
-    AddNewFileOptions(command, "--image,FILE", fresh->file);
-    AddJsonFlag(command, fresh->memory.json);
-    SetAction(command, session, fresh, New);
+    auto [fresh, freshOptions] =
+        NewCommand(group, session, "new", "make the image of a fresh instrument", New);
+    AddNewFileOptions(fresh, "--image,FILE", freshOptions.file);
+    AddJsonFlag(fresh, freshOptions.memory.json);
 }
 
 void AddEeprom(CommandSpec app, Session& session) {

@@ -233,25 +233,22 @@ void Diff(Session& session, const DiffOptions& options) {
 }  // namespace
 
 void AddEepromViews(CommandSpec group, Session& session) {
-    const auto show = std::make_shared<ViewOptions>();
-    CommandSpec command = group.AddCommand("show", "show what is in an EEPROM or an image");
-    command.AddFlag("--numbers", show->numbers, "show vectors as numbers, not as plots").Group("Output");
-    AddMemoryOptions(command, show->memory, "FILE");
-    SetAction(command, session, show, ShowEeprom);
+    auto [show, showOptions] =
+        NewCommand(group, session, "show", "show what is in an EEPROM or an image", ShowEeprom);
+    show.AddFlag("--numbers", showOptions.numbers, "show vectors as numbers, not as plots").Group("Output");
+    AddMemoryOptions(show, showOptions.memory, "FILE");
 
-    const auto check = std::make_shared<ViewOptions>();
-    command = group.AddCommand(
-        "check", "check table, logs, checksums and areas, and tell what the driver would use of them");
-    AddMemoryOptions(command, check->memory, "FILE");
-    SetAction(command, session, check, Check);
+    auto [check, checkOptions] = NewCommand(
+        group, session, "check",
+        "check table, logs, checksums and areas, and tell what the driver would use of them", Check);
+    AddMemoryOptions(check, checkOptions.memory, "FILE");
 
-    const auto diff = std::make_shared<DiffOptions>();
-    command = group.AddCommand("diff",
-                               "compare two images, or an image and an instrument, by value and "
-                               "by area; exit code 9 when they differ");
-    command.Add("A", diff->a, "image file; `-` is standard input").Required();
-    AddMemoryOptions(command, diff->memory, "B");
-    SetAction(command, session, diff, Diff);
+    auto [diff, diffOptions] = NewCommand(group, session, "diff",
+                                          "compare two images, or an image and an instrument, by value and "
+                                          "by area; exit code 9 when they differ",
+                                          Diff);
+    diff.Add("A", diffOptions.a, "image file; `-` is standard input").Required();
+    AddMemoryOptions(diff, diffOptions.memory, "B");
 }
 
 }  // namespace Varnholt::Cli

@@ -52,14 +52,13 @@ void Identify(Session& session, const IdentifyOptions& options) {
 }  // namespace
 
 void AddIdentify(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<IdentifyOptions>();
-    CommandSpec command =
-        app.AddCommand("identify",
-                       "show what an instrument says of itself: chip id, MISC values, mode, "
-                       "CPLD, measurement parameters");
-    AddInstrumentOptions(command, options->instrument);
-    AddJsonFlag(command, options->json);
-    SetAction(command, session, options, Identify);
+    auto [command, options] =
+        NewCommand(app, session, "identify",
+                   "show what an instrument says of itself: chip id, MISC values, mode, "
+                   "CPLD, measurement parameters",
+                   Identify);
+    AddInstrumentOptions(command, options.instrument);
+    AddJsonFlag(command, options.json);
 }
 
 }  // namespace Varnholt::Cli

@@ -60,17 +60,16 @@ void List(Session& session, const ListOptions& options) {
 }  // namespace
 
 void AddList(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<ListOptions>();
-    CommandSpec command = app.AddCommand("list", "list the instruments that are connected");
-    AddTransportOption(command, options->instrument);
-    command.AddFlag("--candidates", options->candidates,
+    auto [command, options] =
+        NewCommand(app, session, "list", "list the instruments that are connected", List);
+    AddTransportOption(command, options.instrument);
+    command.AddFlag("--candidates", options.candidates,
                     "show the USB devices that could be instruments instead, registered or not");
     command
-        .AddFlag("--chip-id", options->chipId,
+        .AddFlag("--chip-id", options.chipId,
                  "show the chip ids as well: opens (and thereby resets) the instruments that are free")
         .Excludes("--candidates");
-    AddJsonFlag(command, options->json);
-    SetAction(command, session, options, List);
+    AddJsonFlag(command, options.json);
 }
 
 }  // namespace Varnholt::Cli

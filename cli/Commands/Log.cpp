@@ -55,17 +55,14 @@ void ResetLog(Session& session, const ResetLogOptions& options) {
 void AddLog(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("log", "show and reset the usage log");
 
-    const auto show = std::make_shared<ShowLogOptions>();
-    CommandSpec command = group.AddCommand("show", "show the usage log");
-    command.AddFlag("--numbers", show->numbers, "show vectors as numbers, not as plots").Group("Output");
-    AddMemoryOptions(command, show->memory);
-    SetAction(command, session, show, ShowLog);
+    auto [show, showOptions] = NewCommand(group, session, "show", "show the usage log", ShowLog);
+    show.AddFlag("--numbers", showOptions.numbers, "show vectors as numbers, not as plots").Group("Output");
+    AddMemoryOptions(show, showOptions.memory);
 
-    const auto reset = std::make_shared<ResetLogOptions>();
-    command = group.AddCommand("reset", "empty both copies of the usage log");
-    AddChangeOptions(command, reset->change);
-    AddMemoryOptions(command, reset->memory);
-    SetAction(command, session, reset, ResetLog);
+    auto [reset, resetOptions] =
+        NewCommand(group, session, "reset", "empty both copies of the usage log", ResetLog);
+    AddChangeOptions(reset, resetOptions.change);
+    AddMemoryOptions(reset, resetOptions.memory);
 }
 
 }  // namespace Varnholt::Cli

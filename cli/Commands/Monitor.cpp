@@ -57,15 +57,14 @@ void Monitor(Session& session, const MonitorOptions& options) {
 }  // namespace
 
 void AddMonitor(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<MonitorOptions>();
-    CommandSpec command = app.AddCommand(
-        "monitor", "print a line each time that the button is pressed, and when the instrument is removed");
-    command.Add("--for", options->seconds, "end after this many seconds (default: with Ctrl-C)")
+    auto [command, options] = NewCommand(
+        app, session, "monitor",
+        "print a line each time that the button is pressed, and when the instrument is removed", Monitor);
+    command.Add("--for", options.seconds, "end after this many seconds (default: with Ctrl-C)")
         .Type("SECONDS")
         .Between(0.001, 1e6);
-    AddInstrumentOptions(command, options->instrument);
-    AddJsonFlag(command, options->json);
-    SetAction(command, session, options, Monitor);
+    AddInstrumentOptions(command, options.instrument);
+    AddJsonFlag(command, options.json);
 }
 
 }  // namespace Varnholt::Cli

@@ -84,21 +84,18 @@ void SetRam(Session& session, const SetRamOptions& options) {
 void AddRam(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("ram", "show and set volatile parameters of an instrument");
 
-    const auto show = std::make_shared<ShowRamOptions>();
-    CommandSpec command = group.AddCommand("show", "show the volatile parameters");
-    AddInstrumentOptions(command, show->instrument);
-    AddJsonFlag(command, show->json);
-    SetAction(command, session, show, ShowRam);
+    auto [show, showOptions] = NewCommand(group, session, "show", "show the volatile parameters", ShowRam);
+    AddInstrumentOptions(show, showOptions.instrument);
+    AddJsonFlag(show, showOptions.json);
 
-    const auto set = std::make_shared<SetRamOptions>();
-    command = group.AddCommand(
-        "set",
-        "set measurement parameters; chooses the measurement mode that can count the integration time");
-    command.Add("ID=VALUE", set->assignments, "new values, for example 2009=0.05").Required();
-    command.AddFlag("--dry-run", set->dryRun, "show what would be set and set nothing").Group("Change");
-    AddInstrumentOptions(command, set->instrument);
-    AddJsonFlag(command, set->json);
-    SetAction(command, session, set, SetRam);
+    auto [set, setOptions] = NewCommand(
+        group, session, "set",
+        "set measurement parameters; chooses the measurement mode that can count the integration time",
+        SetRam);
+    set.Add("ID=VALUE", setOptions.assignments, "new values, for example 2009=0.05").Required();
+    set.AddFlag("--dry-run", setOptions.dryRun, "show what would be set and set nothing").Group("Change");
+    AddInstrumentOptions(set, setOptions.instrument);
+    AddJsonFlag(set, setOptions.json);
 }
 
 }  // namespace Varnholt::Cli

@@ -208,35 +208,34 @@ void TakeReadouts(Session& session, const ReadoutOptions& options) {
 }  // namespace
 
 void AddReadout(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<ReadoutOptions>();
-    CommandSpec command = app.AddCommand("readout", "take readouts of 128 values");
-    command.Add("-n,--repeat", options->repeat, "readouts to take, 0: until Ctrl-C (default: 1)").Type("N");
-    command.Add("-i,--interval", options->interval, "seconds from one readout to the next")
+    auto [command, options] =
+        NewCommand(app, session, "readout", "take readouts of 128 values", TakeReadouts);
+    command.Add("-n,--repeat", options.repeat, "readouts to take, 0: until Ctrl-C (default: 1)").Type("N");
+    command.Add("-i,--interval", options.interval, "seconds from one readout to the next")
         .Type("S")
         .Between(0.0, 86400.0);
     const char* const heading = "Output (default: a table)";
-    command.AddFlag("--json", options->json, "print JSON, one line for each readout").Group(heading);
-    command.AddFlag("--csv", options->csv, "print CSV, one line for each readout")
+    command.AddFlag("--json", options.json, "print JSON, one line for each readout").Group(heading);
+    command.AddFlag("--csv", options.csv, "print CSV, one line for each readout")
         .Excludes("--json")
         .Group(heading);
-    command.AddFlag("--plot", options->plot, "draw the values")
+    command.AddFlag("--plot", options.plot, "draw the values")
         .Excludes("--json")
         .Excludes("--csv")
         .Group(heading);
-    command.AddFlag("--raw", options->raw, "the 256 bytes of each readout as the instrument sent them")
+    command.AddFlag("--raw", options.raw, "the 256 bytes of each readout as the instrument sent them")
         .Excludes("--json")
         .Excludes("--csv")
         .Excludes("--plot")
         .Group(heading);
-    command.AddFlag("--ascii", options->ascii, "draw without Braille characters").Group(heading);
+    command.AddFlag("--ascii", options.ascii, "draw without Braille characters").Group(heading);
     command
-        .Add("-o,--output", options->output,
+        .Add("-o,--output", options.output,
              "write to a file, which is replaced when complete; -: to standard output")
         .Type("FILE")
         .Group(heading);
-    AddMeasurementOptions(command, options->measurement);
-    AddInstrumentOptions(command, options->instrument);
-    SetAction(command, session, options, TakeReadouts);
+    AddMeasurementOptions(command, options.measurement);
+    AddInstrumentOptions(command, options.instrument);
 }
 
 }  // namespace Varnholt::Cli

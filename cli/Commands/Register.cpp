@@ -124,16 +124,15 @@ void Register(Session& session, const RegisterOptions& options) {
 }  // namespace
 
 void AddRegister(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<RegisterOptions>();
-    CommandSpec command = app.AddCommand(
-        "register", "make a kind of USB device known as an instrument (writes a udev rule; as root)");
-    command.Add("VID:PID", options->id, "vendor and product number; `ostra list --candidates` shows them")
+    auto [command, options] = NewCommand(
+        app, session, "register",
+        "make a kind of USB device known as an instrument (writes a udev rule; as root)", Register);
+    command.Add("VID:PID", options.id, "vendor and product number; `ostra list --candidates` shows them")
         .Required();
-    command.AddFlag("--remove", options->remove, "take the registration back");
-    command.AddFlag("--dry-run", options->dryRun, "show what would be written");
-    command.Add("--file", options->file, "the file of udev rules; other rules in it stay");
-    AddJsonFlag(command, options->json);
-    SetAction(command, session, options, Register);
+    command.AddFlag("--remove", options.remove, "take the registration back");
+    command.AddFlag("--dry-run", options.dryRun, "show what would be written");
+    command.Add("--file", options.file, "the file of udev rules; other rules in it stay");
+    AddJsonFlag(command, options.json);
 }
 
 }  // namespace Varnholt::Cli

@@ -26,15 +26,13 @@ void ResetInstrument(Session& session, const ResetInstrumentOptions& options) {
 }  // namespace
 
 void AddReset(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<ResetInstrumentOptions>();
-    CommandSpec command = app.AddCommand("reset", "reset an instrument");
+    auto [command, options] = NewCommand(app, session, "reset", "reset an instrument", ResetInstrument);
     command
-        .Add("--code", options->code, "reset code, one byte (default: 31, the one that every opening sends)")
+        .Add("--code", options.code, "reset code, one byte (default: 31, the one that every opening sends)")
         .Type("N")
         .Between(0, 255);
-    AddInstrumentOptions(command, options->instrument);
-    AddJsonFlag(command, options->json);
-    SetAction(command, session, options, ResetInstrument);
+    AddInstrumentOptions(command, options.instrument);
+    AddJsonFlag(command, options.json);
 }
 
 }  // namespace Varnholt::Cli

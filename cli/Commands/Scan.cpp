@@ -158,47 +158,45 @@ void Scan(Session& session, const ScanOptions& options) {
 }  // namespace
 
 void AddScan(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<ScanOptions>();
-    CommandSpec command = app.AddCommand(
-        "scan", "stream records: a fixed number of them, or until the instrument stops; Ctrl-C ends it");
+    auto [command, options] = NewCommand(
+        app, session, "scan",
+        "stream records: a fixed number of them, or until the instrument stops; Ctrl-C ends it", Scan);
     command
-        .Add("--total", options->total,
-             "bytes to read; over the transport native a multiple of --record-size")
+        .Add("--total", options.total, "bytes to read; over the transport native a multiple of --record-size")
         .Type("BYTES")
         .Between(1, std::numeric_limits<std::uint32_t>::max());
-    command.Add("--records", options->records, "records to read")
+    command.Add("--records", options.records, "records to read")
         .Type("N")
         .Between(1, std::numeric_limits<std::uint32_t>::max())
         .Excludes("--total");
-    command.Add("--record-size", options->recordSize, "bytes of a record, 1 to 6553 (default: 256)")
+    command.Add("--record-size", options.recordSize, "bytes of a record, 1 to 6553 (default: 256)")
         .Type("BYTES")
         .Between(1, Service::LongestScanRecord);
-    command.Add("--timeout", options->timeout, "seconds that a transfer may take (default: 5)")
+    command.Add("--timeout", options.timeout, "seconds that a transfer may take (default: 5)")
         .Type("S")
         .Between(0, 86400);
     const char* const group = "Output (default: CSV on standard output, one record a line)";
     command
-        .Add("-o,--output", options->output,
+        .Add("-o,--output", options.output,
              "write to a file, which is replaced when complete; -: to standard output")
         .Type("FILE")
         .Group(group);
-    command.AddFlag("--discard", options->discard, "keep nothing of a scan that ends early").Group(group);
-    command.AddFlag("--raw", options->raw, "the bytes as the instrument sent them").Group(group);
-    command.AddFlag("--header", options->header, "CSV: begin with the names of the columns")
+    command.AddFlag("--discard", options.discard, "keep nothing of a scan that ends early").Group(group);
+    command.AddFlag("--raw", options.raw, "the bytes as the instrument sent them").Group(group);
+    command.AddFlag("--header", options.header, "CSV: begin with the names of the columns")
         .Excludes("--raw")
         .Group(group);
-    command.AddFlag("--number", options->number, "CSV: a column with each record's number, from 1")
+    command.AddFlag("--number", options.number, "CSV: a column with each record's number, from 1")
         .Excludes("--raw")
         .Group(group);
     command
-        .AddFlag("--time", options->time,
+        .AddFlag("--time", options.time,
                  "CSV: a column with the seconds from the start until the record's transfer came")
         .Excludes("--raw")
         .Group(group);
-    command.AddFlag("--json", options->json, "print a summary as JSON; needs --output").Group(group);
-    AddMeasurementOptions(command, options->measurement);
-    AddInstrumentOptions(command, options->instrument);
-    SetAction(command, session, options, Scan);
+    command.AddFlag("--json", options.json, "print a summary as JSON; needs --output").Group(group);
+    AddMeasurementOptions(command, options.measurement);
+    AddInstrumentOptions(command, options.instrument);
 }
 
 }  // namespace Varnholt::Cli

@@ -83,18 +83,14 @@ void PutWord(Session& session, const PutWordOptions& options) {
 void AddWord(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("word", "read and write raw words of the EEPROM, 4 bytes each");
 
-    const auto get = std::make_shared<GetWordOptions>();
-    CommandSpec command = group.AddCommand("get", "show raw words");
-    command.Add("ID", get->ids, "10200 to 10239 (default: 10200 to 10215; those behind are the table's)");
-    AddMemoryOptions(command, get->memory);
-    SetAction(command, session, get, GetWord);
+    auto [get, getOptions] = NewCommand(group, session, "get", "show raw words", GetWord);
+    get.Add("ID", getOptions.ids, "10200 to 10239 (default: 10200 to 10215; those behind are the table's)");
+    AddMemoryOptions(get, getOptions.memory);
 
-    const auto put = std::make_shared<PutWordOptions>();
-    command = group.AddCommand("put", "write raw words");
-    command.Add("ID=VALUE", put->assignments, "words 10200 to 10215, decimal or 0x...").Required();
-    AddChangeOptions(command, put->change);
-    AddMemoryOptions(command, put->memory);
-    SetAction(command, session, put, PutWord);
+    auto [put, putOptions] = NewCommand(group, session, "put", "write raw words", PutWord);
+    put.Add("ID=VALUE", putOptions.assignments, "words 10200 to 10215, decimal or 0x...").Required();
+    AddChangeOptions(put, putOptions.change);
+    AddMemoryOptions(put, putOptions.memory);
 }
 
 }  // namespace Varnholt::Cli

@@ -38,17 +38,16 @@ void WriteImage(Session& session, const WriteImageOptions& options) {
 }  // namespace
 
 void AddWriteImage(CommandSpec app, Session& session) {
-    const auto options = std::make_shared<WriteImageOptions>();
-    CommandSpec command =
-        app.AddCommand("write-image",
-                       "write the whole of an EEPROM image, whatever is in it, as the "
-                       "library does, and read it back (`ostra eeprom write` is the safe way)");
-    command.Add("--image,FILE", options->file, "image of 8192 bytes; `-` is standard input")
+    auto [command, options] =
+        NewCommand(app, session, "write-image",
+                   "write the whole of an EEPROM image, whatever is in it, as the "
+                   "library does, and read it back (`ostra eeprom write` is the safe way)",
+                   WriteImage);
+    command.Add("--image,FILE", options.file, "image of 8192 bytes; `-` is standard input")
         .Type("FILE")
         .Required();
-    AddInstrumentOptions(command, options->instrument);
-    AddJsonFlag(command, options->json);
-    SetAction(command, session, options, WriteImage);
+    AddInstrumentOptions(command, options.instrument);
+    AddJsonFlag(command, options.json);
 }
 
 }  // namespace Varnholt::Cli
