@@ -7,16 +7,9 @@
 #include "Utilities/Exceptions/Location.h"
 
 namespace Varnholt::Service {
-namespace {
 
 using DeviceDriver::Generic::Utilities::IOException;
 using Utilities::Exceptions::Here;
-
-[[noreturn]] void Refuse() {
-    throw IOException("an image file knows no other commands than those of its EEPROM", Here());
-}
-
-}  // namespace
 
 std::uint8_t* ImageTransport::Place(const Bytes4& address, std::uint32_t count) const {
     const std::size_t first = Protocol::LoadBig32(address.data());
@@ -40,46 +33,8 @@ void ImageTransport::GetDeviceIdentifier(std::string& identifier) {
     identifier.clear();
 }
 
-void ImageTransport::StartScan(std::uint32_t, std::uint32_t, std::uint32_t) {
-    Refuse();
-}
-void ImageTransport::GetScanData(std::uint8_t*, std::uint32_t*) {
-    Refuse();
-}
-void ImageTransport::MeasureRequest(std::uint8_t*, std::uint32_t, std::uint32_t) {
-    Refuse();
-}
-void ImageTransport::SetMeasureParameters(const Bytes2&, const Bytes2&, const Bytes2&, std::uint8_t) {
-    Refuse();
-}
-void ImageTransport::GetMeasureParameters(Bytes2&, Bytes2&, Bytes2&, std::uint8_t&, std::uint8_t&) {
-    Refuse();
-}
-void ImageTransport::SetMeasureMode(std::uint8_t) {
-    Refuse();
-}
-void ImageTransport::GetMeasureMode(std::uint8_t&, std::uint8_t&, std::uint8_t&, std::uint8_t&, std::uint8_t&,
-                                    std::uint8_t&) {
-    Refuse();
-}
-void ImageTransport::WriteCPLD(const Bytes2&, const Bytes2&, const Bytes2&) {
-    Refuse();
-}
-void ImageTransport::ReadCPLD(Bytes2&) {
-    Refuse();
-}
-void ImageTransport::DownloadRAMFirmware(std::uint16_t, const std::uint8_t*, std::uint32_t) {
-    Refuse();
-}
-void ImageTransport::DownloadEEPROMFirmware(const Bytes4&, const Bytes2&, const std::uint8_t*,
-                                            std::uint32_t) {
-    Refuse();
-}
-void ImageTransport::GetMISC(std::uint8_t&, Bytes2&, std::uint8_t&, Bytes2&, Bytes2&) {
-    Refuse();
-}
-void ImageTransport::GetChipID(std::uint8_t*) {
-    Refuse();
+void ImageTransport::Refuse() {
+    throw IOException("an image file knows no other commands than those of its EEPROM", Here());
 }
 
 }  // namespace Varnholt::Service

@@ -23,23 +23,30 @@ class ImageTransport final : public DeviceDriver::Ostra::LowLevel::PellandoFunct
     void Reset(const Bytes2&) override {}
     void RemoveListener(DeviceDriver::Generic::EventListener*) override {}
 
-    void StartScan(std::uint32_t, std::uint32_t, std::uint32_t) override;
-    void GetScanData(std::uint8_t*, std::uint32_t*) override;
-    void MeasureRequest(std::uint8_t*, std::uint32_t, std::uint32_t) override;
-    void SetMeasureParameters(const Bytes2&, const Bytes2&, const Bytes2&, std::uint8_t) override;
-    void GetMeasureParameters(Bytes2&, Bytes2&, Bytes2&, std::uint8_t&, std::uint8_t&) override;
-    void SetMeasureMode(std::uint8_t) override;
+    void StartScan(std::uint32_t, std::uint32_t, std::uint32_t) override { Refuse(); }
+    void GetScanData(std::uint8_t*, std::uint32_t*) override { Refuse(); }
+    void MeasureRequest(std::uint8_t*, std::uint32_t, std::uint32_t) override { Refuse(); }
+    void SetMeasureParameters(const Bytes2&, const Bytes2&, const Bytes2&, std::uint8_t) override {
+        Refuse();
+    }
+    void GetMeasureParameters(Bytes2&, Bytes2&, Bytes2&, std::uint8_t&, std::uint8_t&) override { Refuse(); }
+    void SetMeasureMode(std::uint8_t) override { Refuse(); }
     void GetMeasureMode(std::uint8_t&, std::uint8_t&, std::uint8_t&, std::uint8_t&, std::uint8_t&,
-                        std::uint8_t&) override;
-    void WriteCPLD(const Bytes2&, const Bytes2&, const Bytes2&) override;
-    void ReadCPLD(Bytes2&) override;
-    void DownloadRAMFirmware(std::uint16_t, const std::uint8_t*, std::uint32_t) override;
-    void DownloadEEPROMFirmware(const Bytes4&, const Bytes2&, const std::uint8_t*, std::uint32_t) override;
-    void GetMISC(std::uint8_t&, Bytes2&, std::uint8_t&, Bytes2&, Bytes2&) override;
-    void GetChipID(std::uint8_t*) override;
+                        std::uint8_t&) override {
+        Refuse();
+    }
+    void WriteCPLD(const Bytes2&, const Bytes2&, const Bytes2&) override { Refuse(); }
+    void ReadCPLD(Bytes2&) override { Refuse(); }
+    void DownloadRAMFirmware(std::uint16_t, const std::uint8_t*, std::uint32_t) override { Refuse(); }
+    void DownloadEEPROMFirmware(const Bytes4&, const Bytes2&, const std::uint8_t*, std::uint32_t) override {
+        Refuse();
+    }
+    void GetMISC(std::uint8_t&, Bytes2&, std::uint8_t&, Bytes2&, Bytes2&) override { Refuse(); }
+    void GetChipID(std::uint8_t*) override { Refuse(); }
     void GetDeviceIdentifier(std::string& identifier) override;
 
   private:
+    [[noreturn]] static void Refuse();
     std::uint8_t* Place(const Bytes4& address, std::uint32_t count) const;
 
     EepromImage& image_;
