@@ -12,6 +12,9 @@ namespace Varnholt::Cli {
 /// the end of the process.
 void SecureStandardStreams();
 
+/// A stream that a program finds open, by its number.
+enum class Standard { Output = 1, Error = 2 };
+
 struct TerminalSize {
     int columns = 80;
     int rows = 24;
@@ -28,8 +31,7 @@ struct StreamFacts {
     /// To be asked each time: a window changes its size.
     std::function<TerminalSize()> size = [] { return TerminalSize{}; };
 };
-StreamFacts FactsOfStandardOutput();
-StreamFacts FactsOfStandardError();
+StreamFacts FactsOf(Standard stream);
 
 /// Standard output carries bytes from now on, without translation of line ends.
 void SetStandardOutputBinary();

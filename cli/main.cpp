@@ -13,16 +13,16 @@ int main(int argc, char** argv) {
         const SignalWatch watch([&interruption] { interruption.Request(); });
         // Both can be stopped, by a reader that does not read or a terminal that is held: then too the user's
         // wish to end is seen.
-        DescriptorStream out(OutputDescriptor::StandardOutput(), interruption,
+        DescriptorStream out(OutputDescriptor::Of(Standard::Output), interruption,
                              DescriptorStream::Lost::IsFailure);
-        DescriptorStream err(OutputDescriptor::StandardError(), interruption,
+        DescriptorStream err(OutputDescriptor::Of(Standard::Error), interruption,
                              DescriptorStream::Lost::IsIgnored);
         err << std::unitbuf;
         err.tie(&out);
-        DescriptorStream log(OutputDescriptor::StandardError(), interruption,
+        DescriptorStream log(OutputDescriptor::Of(Standard::Error), interruption,
                              DescriptorStream::Lost::IsIgnored);
         log << std::unitbuf;
-        Streams streams{out, err, log, FactsOfStandardOutput(), FactsOfStandardError()};
+        Streams streams{out, err, log, FactsOf(Standard::Output), FactsOf(Standard::Error)};
         return static_cast<int>(RunTool({argv + 1, argv + argc}, streams, interruption));
     } catch (const std::exception& exception) {
         std::cerr << "ostra: " << exception.what() << '\n';

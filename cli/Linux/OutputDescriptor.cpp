@@ -47,15 +47,10 @@ bool IsFile(int descriptor) {
 OutputDescriptor::OutputDescriptor(int openDescriptor, Ownership ownership)
     : descriptor_(openDescriptor), isOwn_(ownership == Ownership::Own), isFile_(IsFile(openDescriptor)) {}
 
-OutputDescriptor OutputDescriptor::StandardOutput() {
-    const int twin = NonBlockingTwin(STDOUT_FILENO);
-    return twin < 0 ? OutputDescriptor(STDOUT_FILENO, Ownership::Borrowed)
-                    : OutputDescriptor(twin, Ownership::Own);
-}
-
-OutputDescriptor OutputDescriptor::StandardError() {
-    const int twin = NonBlockingTwin(STDERR_FILENO);
-    return twin < 0 ? OutputDescriptor(STDERR_FILENO, Ownership::Borrowed)
+OutputDescriptor OutputDescriptor::Of(Standard stream) {
+    const int descriptor = static_cast<int>(stream);
+    const int twin = NonBlockingTwin(descriptor);
+    return twin < 0 ? OutputDescriptor(descriptor, Ownership::Borrowed)
                     : OutputDescriptor(twin, Ownership::Own);
 }
 

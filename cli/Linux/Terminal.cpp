@@ -49,16 +49,6 @@ TerminalSize SizeOf(int descriptor) {
     return size;
 }
 
-StreamFacts FactsOf(int descriptor) {
-    StreamFacts facts;
-    facts.isTerminal = ::isatty(descriptor) != 0;
-    facts.movesCursor = facts.isTerminal && Environment("TERM") != "dumb";
-    facts.showsColor = facts.movesCursor && Environment("NO_COLOR").empty();
-    facts.showsUtf8 = EnvironmentSaysUtf8();
-    facts.size = [descriptor] { return SizeOf(descriptor); };
-    return facts;
-}
-
 /// Of the signals that ask to end, those that whoever started the program (nohup, a shell's background) does
 /// not want ignored. SIGTERM also ends the watching.
 sigset_t WatchedSignals() {
@@ -82,12 +72,15 @@ void SecureStandardStreams() {
     static_cast<void>(::signal(SIGXFSZ, SIG_IGN));
 }
 
-StreamFacts FactsOfStandardOutput() {
-    return FactsOf(STDOUT_FILENO);
-}
-
-StreamFacts FactsOfStandardError() {
-    return FactsOf(STDERR_FILENO);
+StreamFacts FactsOf(Standard stream) {
+    const int descriptor = static_cast<int>(stream);
+    StreamFacts facts;
+    facts.isTerminal = ::isatty(descriptor) != 0;
+    facts.movesCursor = facts.isTerminal && Environment("TERM") != "dumb";
+    facts.showsColor = facts.movesCursor && Environment("NO_COLOR").empty();
+    facts.showsUtf8 = EnvironmentSaysUtf8();
+    facts.size = [descriptor] { return SizeOf(descriptor); };
+    return facts;
 }
 
 void SetStandardOutputBinary() {}

@@ -9,6 +9,7 @@
 #include <utility>
 
 #include "Service/Interruption.h"
+#include "Terminal.h"
 
 namespace Varnholt::Cli {
 
@@ -17,8 +18,7 @@ namespace Varnholt::Cli {
 class OutputDescriptor final {
   public:
     /// Closed by the object only where it has opened them.
-    static OutputDescriptor StandardOutput();
-    static OutputDescriptor StandardError();
+    static OutputDescriptor Of(Standard stream);
     /// A new file; one that is there already is an error.
     static OutputDescriptor Create(const std::string& path, std::error_code& error);
     /// What is there and is no ordinary file. Waits for the reader of a FIFO, until the user wants to end:

@@ -6,7 +6,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <cstdio>
 #include <utility>
 
 namespace Varnholt::Cli {
@@ -31,12 +30,8 @@ OutputDescriptor::OutputDescriptor(int openDescriptor, Ownership ownership)
       isOwn_(ownership == Ownership::Own),
       isFile_(openDescriptor >= 0 && IsFile(openDescriptor)) {}
 
-OutputDescriptor OutputDescriptor::StandardOutput() {
-    return {::_fileno(stdout), Ownership::Borrowed};
-}
-
-OutputDescriptor OutputDescriptor::StandardError() {
-    return {::_fileno(stderr), Ownership::Borrowed};
+OutputDescriptor OutputDescriptor::Of(Standard stream) {
+    return {static_cast<int>(stream), Ownership::Borrowed};
 }
 
 OutputDescriptor OutputDescriptor::Create(const std::string& path, std::error_code& error) {

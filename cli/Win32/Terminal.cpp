@@ -24,9 +24,13 @@ TerminalSize SizeOf(HANDLE stream) {
     return size;
 }
 
-StreamFacts FactsOf(DWORD which) {
+}  // namespace
+
+void SecureStandardStreams() {}  // the run-time library opens none in their place
+
+StreamFacts FactsOf(Standard which) {
     StreamFacts facts;
-    const HANDLE stream = ::GetStdHandle(which);
+    const HANDLE stream = ::GetStdHandle(which == Standard::Output ? STD_OUTPUT_HANDLE : STD_ERROR_HANDLE);
     DWORD mode = 0;
     facts.isTerminal = ::GetConsoleMode(stream, &mode) != 0;
     // Drawing and colours need a console that understands escape sequences (0x0004), which old ones do not.
@@ -37,18 +41,6 @@ StreamFacts FactsOf(DWORD which) {
     facts.showsUtf8 = ::GetConsoleOutputCP() == CP_UTF8;
     facts.size = [stream] { return SizeOf(stream); };
     return facts;
-}
-
-}  // namespace
-
-void SecureStandardStreams() {}  // the run-time library opens none in their place
-
-StreamFacts FactsOfStandardOutput() {
-    return FactsOf(STD_OUTPUT_HANDLE);
-}
-
-StreamFacts FactsOfStandardError() {
-    return FactsOf(STD_ERROR_HANDLE);
 }
 
 void SetStandardOutputBinary() {
