@@ -2,22 +2,23 @@
 
 #include <algorithm>
 #include <new>
+#include <span>
 
 namespace Varnholt::Simulator {
 
 namespace {
 
-void FillWithGarbage(std::uint8_t* data, std::size_t length, std::uint32_t seed) {
-    std::uint32_t state = seed * 2654435761U + 1;
-    for (std::size_t i = 0; i < length; ++i) {
-        state = state * 1664525U + 1013904223U;
-        data[i] = static_cast<std::uint8_t>(state >> 24);
-    }
-}
-
-void FlipBit(std::uint8_t* data, std::size_t length, std::uint32_t bit) {
-    if (length > 0) {
-        data[bit / 8 % length] ^= static_cast<std::uint8_t>(1U << bit % 8);
+/// Garbage, or a wrong bit, where the transfer has that fault.
+void Spoil(std::span<std::uint8_t> data, const FaultyTransfer& transfer, std::uint32_t seed) {
+    if (transfer.Has(FaultKind::Garbage)) {
+        std::uint32_t state = seed * 2654435761U + 1;
+        for (std::uint8_t& byte : data) {
+            state = state * 1664525U + 1013904223U;
+            byte = static_cast<std::uint8_t>(state >> 24);
+        }
+    } else if (transfer.Has(FaultKind::Flip) && !data.empty()) {
+        const std::uint32_t bit = transfer.fault->argument.value_or(0);
+        data[bit / 8 % data.size()] ^= static_cast<std::uint8_t>(1U << bit % 8);
     }
 }
 
@@ -25,15 +26,13 @@ void FlipBit(std::uint8_t* data, std::size_t length, std::uint32_t bit) {
 
 void DataFaults::ReplaceOut(FaultyTransfer& transfer) {
     Bytes& data = transfer.replacedData;
-    data.assign(transfer.data, transfer.data + transfer.length);
-    if (transfer.Has(FaultKind::Garbage)) {
-        FillWithGarbage(data.data(), data.size(), script_.Hits());
-    } else if (transfer.Has(FaultKind::Flip)) {
-        FlipBit(data.data(), data.size(), transfer.fault->argument.value_or(0));
-    } else {
+    if (transfer.Has(FaultKind::Stale)) {
         const std::lock_guard lock(mutex_);
         data = lastData_[{transfer.endpoint, false}];
         data.resize(transfer.length);
+    } else {
+        data.assign(transfer.data, transfer.data + transfer.length);
+        Spoil(data, transfer, script_.Hits());
     }
     transfer.data = data.data();
 }
@@ -58,11 +57,7 @@ std::optional<std::uint32_t> DataFaults::RepeatIn(FaultyTransfer& transfer) {
 }
 
 void DataFaults::ChangeIn(FaultyTransfer& transfer) {
-    if (transfer.Has(FaultKind::Garbage)) {
-        FillWithGarbage(transfer.data, transfer.actualLength, script_.Hits());
-    } else if (transfer.Has(FaultKind::Flip)) {
-        FlipBit(transfer.data, transfer.actualLength, transfer.fault->argument.value_or(0));
-    }
+    Spoil({transfer.data, transfer.actualLength}, transfer, script_.Hits());
     if (keepsData_) {
         try {
             const std::lock_guard lock(mutex_);
