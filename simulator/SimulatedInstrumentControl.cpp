@@ -47,14 +47,13 @@ void SimulatedInstrument::Control(Transfer& transfer, std::uint64_t now, Complet
         } else if (setup.requestType == vendorType) {
             accepted = commands_.Out(setup, {transfer.data, length});
         }
-        if (accepted && !standard && setup.request == static_cast<std::uint8_t>(Protocol::Request::Measure)) {
+        if (accepted && !standard) {
+            const bool exposes = settings_.takesIntegrationTime &&
+                                 setup.request == static_cast<std::uint8_t>(Protocol::Request::Measure);
             const Exposure exposure = commands_.NextExposure();
             constexpr std::uint64_t nanosecondsPerMicrosecond = 1000;
-            answersFrom_ = settings_.takesIntegrationTime
-                               ? now + exposure.microseconds * exposure.averages * nanosecondsPerMicrosecond
-                               : now;
-        } else if (accepted && !standard) {
-            answersFrom_ = now;
+            answersFrom_ =
+                now + (exposes ? exposure.microseconds * exposure.averages * nanosecondsPerMicrosecond : 0);
         }
         done.Add(transfer, accepted ? TransferStatus::Completed : TransferStatus::Stalled,
                  accepted ? length : 0);
