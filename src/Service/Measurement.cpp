@@ -18,13 +18,9 @@ void SetIntegrationTime(const Commands& commands, double seconds) {
     set.SetProperty(Ids::IntegrationTime, Property(static_cast<float>(seconds)));
     set.SetProperty(Ids::SecondTime, Property(0.0F));
     set.SetProperty(Ids::ThirdParameter, Property(std::int32_t{Fixed::P3}));
-    const auto setFlag = [&set](std::uint16_t id, int bit) {
-        set.SetProperty(id, Property(std::int32_t{Fixed::P4 >> bit & 1}));
-    };
-    setFlag(Ids::FlagBit0, 0);
-    setFlag(Ids::FlagBit1, 1);
-    setFlag(Ids::FlagBit2, 2);
-    setFlag(Ids::FlagBit3, 3);
+    for (int bit = 0; const std::uint16_t id : {Ids::FlagBit0, Ids::FlagBit1, Ids::FlagBit2, Ids::FlagBit3}) {
+        set.SetProperty(id, Property(std::int32_t{Fixed::P4 >> bit++ & 1}));
+    }
     ram.Store(set);
 }
 
