@@ -111,8 +111,8 @@ NTSTATUS NTAPI DriverEntry(DRIVER_OBJECT* driver, UNICODE_STRING* registryPath) 
     driver->DriverUnload = Unload;
     driver->MajorFunction[IRP_MJ_CREATE] = DispatchCreate;
     driver->MajorFunction[IRP_MJ_CLOSE] = DispatchClose;
-    driver->MajorFunction[IRP_MJ_READ] = DispatchRead;
-    driver->MajorFunction[IRP_MJ_WRITE] = DispatchWrite;
+    driver->MajorFunction[IRP_MJ_READ] = DispatchTransfer;
+    driver->MajorFunction[IRP_MJ_WRITE] = DispatchTransfer;
     driver->MajorFunction[IRP_MJ_DEVICE_CONTROL] = DispatchControl;
     driver->MajorFunction[IRP_MJ_PNP] = DispatchPnp;
     driver->MajorFunction[IRP_MJ_POWER] = DispatchOther;

@@ -36,8 +36,7 @@ NTSTATUS CompleteAtOnce(IRP* packet, NTSTATUS status, ULONG_PTR bytes);
 /* Requests.c */
 NTSTATUS NTAPI DispatchCreate(DEVICE_OBJECT* device, IRP* packet);
 NTSTATUS NTAPI DispatchClose(DEVICE_OBJECT* device, IRP* packet);
-NTSTATUS NTAPI DispatchRead(DEVICE_OBJECT* device, IRP* packet);
-NTSTATUS NTAPI DispatchWrite(DEVICE_OBJECT* device, IRP* packet);
+NTSTATUS NTAPI DispatchTransfer(DEVICE_OBJECT* device, IRP* packet);
 NTSTATUS NTAPI DispatchControl(DEVICE_OBJECT* device, IRP* packet);
 
 /* PipeNames.c */

@@ -82,25 +82,16 @@ static NTSTATUS Started(IRP* packet, NTSTATUS status, ULONG bytes) {
     return status == STATUS_PENDING ? status : CompleteAtOnce(packet, status, bytes);
 }
 
-NTSTATUS NTAPI DispatchRead(DEVICE_OBJECT* device, IRP* packet) {
+NTSTATUS NTAPI DispatchTransfer(DEVICE_OBJECT* device, IRP* packet) {
     (void)device;
     if (!FileOf(packet))
         return Refuse(packet);
-    const ULONG length = IoGetCurrentIrpStackLocation(packet)->Parameters.Read.Length;
+    const IO_STACK_LOCATION* const stack = IoGetCurrentIrpStackLocation(packet);
+    const int reads = stack->MajorFunction == IRP_MJ_READ;
+    const ULONG length = reads ? stack->Parameters.Read.Length : stack->Parameters.Write.Length;
     ULONG bytes = 0;
-    const NTSTATUS status =
-        StandInRead(FileOf(packet), packet->AssociatedIrp.SystemBuffer, length, MakeRequest(packet), &bytes);
-    return Started(packet, status, bytes);
-}
-
-NTSTATUS NTAPI DispatchWrite(DEVICE_OBJECT* device, IRP* packet) {
-    (void)device;
-    if (!FileOf(packet))
-        return Refuse(packet);
-    const ULONG length = IoGetCurrentIrpStackLocation(packet)->Parameters.Write.Length;
-    ULONG bytes = 0;
-    const NTSTATUS status =
-        StandInWrite(FileOf(packet), packet->AssociatedIrp.SystemBuffer, length, MakeRequest(packet), &bytes);
+    const NTSTATUS status = StandInTransfer(FileOf(packet), reads, packet->AssociatedIrp.SystemBuffer, length,
+                                            MakeRequest(packet), &bytes);
     return Started(packet, status, bytes);
 }
 

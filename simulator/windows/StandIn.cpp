@@ -75,15 +75,11 @@ void StandInClose(StandInFile* file) {
     delete file;
 }
 
-Status StandInRead(StandInFile* file, void* buffer, unsigned long length, StandInRequest request,
-                   unsigned long* bytes) {
-    return Guarded([&] { return file->object->Read(Bytes<std::uint8_t>(buffer, length), request, *bytes); });
-}
-
-Status StandInWrite(StandInFile* file, const void* buffer, unsigned long length, StandInRequest request,
-                    unsigned long* bytes) {
-    return Guarded(
-        [&] { return file->object->Write(Bytes<const std::uint8_t>(buffer, length), request, *bytes); });
+Status StandInTransfer(StandInFile* file, int reads, void* buffer, unsigned long length,
+                       StandInRequest request, unsigned long* bytes) {
+    return Guarded([&] {
+        return file->object->Transfer(reads != 0, Bytes<std::uint8_t>(buffer, length), request, *bytes);
+    });
 }
 
 Status StandInControl(StandInFile* file, unsigned long code, const void* input, unsigned long inputLength,

@@ -51,10 +51,8 @@ STAND_IN_API void StandInClose(StandInFile* file);
 
 /* Start a request: either the final status with `*bytes` set, or STATUS_PENDING after `pending` was called.
  * The buffers outlive the request. */
-STAND_IN_API Status StandInRead(StandInFile* file, void* buffer, unsigned long length, StandInRequest request,
-                                unsigned long* bytes);
-STAND_IN_API Status StandInWrite(StandInFile* file, const void* buffer, unsigned long length,
-                                 StandInRequest request, unsigned long* bytes);
+STAND_IN_API Status StandInTransfer(StandInFile* file, int reads, void* buffer, unsigned long length,
+                                    StandInRequest request, unsigned long* bytes);
 STAND_IN_API Status StandInControl(StandInFile* file, unsigned long code, const void* input,
                                    unsigned long inputLength, void* output, unsigned long outputLength,
                                    StandInRequest request, unsigned long* bytes);

@@ -15,7 +15,6 @@
 namespace Varnholt::Simulator {
 
 using Platform::Drivers::Decision;
-using Platform::Usb::Transfer;
 
 /// A request on its way. Kept alive by the file while it runs, and by whoever cancels it.
 class StandInFileObject::Running final : public Platform::Usb::TransferClient {
@@ -25,7 +24,7 @@ class StandInFileObject::Running final : public Platform::Usb::TransferClient {
         transfer.client = this;
     }
 
-    void TransferCompleted(Transfer& completed) noexcept override {
+    void TransferCompleted(Platform::Usb::Transfer& completed) noexcept override {
         if (completed.status == Platform::Usb::TransferStatus::Cancelled &&
             file->instrument_->IsUnplugged()) {
             completed.status = Platform::Usb::TransferStatus::DeviceGone;
@@ -36,7 +35,7 @@ class StandInFileObject::Running final : public Platform::Usb::TransferClient {
                                                    : file->driver_->OutcomeOf(completed.status)));
     }
 
-    Transfer transfer;
+    Platform::Usb::Transfer transfer;
     std::atomic<bool> givenUp = false;  ///< the driver cancels it because its time is over
     const std::shared_ptr<StandInFileObject> file;
     const StandInRequest request;
@@ -52,21 +51,12 @@ StandInFileObject::~StandInFileObject() {
     instrument_->Remove(*this);
 }
 
-Status StandInFileObject::Read(std::span<std::uint8_t> buffer, const StandInRequest& request,
-                               unsigned long& bytes) {
+Status StandInFileObject::Transfer(bool reads, std::span<std::uint8_t> buffer, const StandInRequest& request,
+                                   unsigned long& bytes) {
     const auto running = std::make_shared<Running>(shared_from_this(), request);
     running->transfer.data = buffer.data();
     running->transfer.length = static_cast<std::uint32_t>(buffer.size());
-    return Start(driver_->Read(running->transfer), running, bytes);
-}
-
-Status StandInFileObject::Write(std::span<const std::uint8_t> data, const StandInRequest& request,
-                                unsigned long& bytes) {
-    const auto running = std::make_shared<Running>(shared_from_this(), request);
-    // A transfer has one buffer for both directions; that of a write is only read.
-    running->transfer.data = const_cast<std::uint8_t*>(data.data());
-    running->transfer.length = static_cast<std::uint32_t>(data.size());
-    return Start(driver_->Write(running->transfer), running, bytes);
+    return Start(driver_->Move(reads, running->transfer), running, bytes);
 }
 
 Status StandInFileObject::Control(std::uint32_t code, std::span<const std::uint8_t> input,
@@ -202,15 +192,14 @@ std::optional<Status> StandInFileObject::TestControl(std::uint32_t code, std::sp
             break;
         }
         case TestControls::ReadCounts: {
-            const auto counts = simulated.WithCommands([](const Commands& commands) {
+            auto counts = simulated.WithCommands([](const Commands& commands) {
                 return TestControls::Counts{static_cast<std::uint32_t>(commands.measurements),
                                             static_cast<std::uint32_t>(commands.resets),
                                             static_cast<std::uint32_t>(commands.buttonReports), 0, 0};
             });
-            auto full = counts;
-            full.openFiles = static_cast<std::uint32_t>(instrument_->OpenFiles());
-            full.pendingTransfers = static_cast<std::uint32_t>(simulated.PendingTransfers());
-            answer(&full, sizeof full);
+            counts.openFiles = static_cast<std::uint32_t>(instrument_->OpenFiles());
+            counts.pendingTransfers = static_cast<std::uint32_t>(simulated.PendingTransfers());
+            answer(&counts, sizeof counts);
             break;
         }
         default:

@@ -23,8 +23,8 @@ class StandInFileObject final : public std::enable_shared_from_this<StandInFileO
     StandInFileObject(const StandInFileObject&) = delete;
     StandInFileObject& operator=(const StandInFileObject&) = delete;
 
-    Status Read(std::span<std::uint8_t> buffer, const StandInRequest& request, unsigned long& bytes);
-    Status Write(std::span<const std::uint8_t> data, const StandInRequest& request, unsigned long& bytes);
+    Status Transfer(bool reads, std::span<std::uint8_t> buffer, const StandInRequest& request,
+                    unsigned long& bytes);
     Status Control(std::uint32_t code, std::span<const std::uint8_t> input, std::span<std::uint8_t> output,
                    const StandInRequest& request, unsigned long& bytes);
 
