@@ -53,7 +53,9 @@ void ScanCsv(benchmark::State& state) {
     Service::Interruption none;
     Cli::RecordingFile file("/dev/null", none);
     Cli::RecordWriter writer({RecordSize, false, false, {}}, file);
-    Service::ScanRecorder recorder(RecordSize, writer, [](std::uint64_t) {});
+    Service::ScanReport report;
+    Service::Progress unwatched;
+    Service::ScanRecorder recorder(RecordSize, writer, report, unwatched);
     double streamed = 0;
     double recorded = 0;
     for (auto _ : state) {

@@ -141,7 +141,7 @@ Readout Take(Service::OpenedInstrument& instrument, std::uint32_t number, std::u
              Service::ElapsedTime& time) {
     const std::uint64_t elapsed = time.Milliseconds();
     instrument.UsedContext().Sleep(static_cast<std::uint32_t>(due > elapsed ? due - elapsed : 0));
-    const double seconds = static_cast<double>(time.Milliseconds()) / 1000;
+    const double seconds = time.Seconds();
     return {number, seconds, TakeReadout(instrument)};
 }
 
@@ -184,7 +184,7 @@ void TakeInto(RecordOutput& output, Session& session, const ReadoutOptions& opti
     output.Complete();
     if (GoesToFile(options.output)) {
         session.Note(fmt::format("{} in {:.3f} s, written to {}", CountText(output.Records(), ReadoutNoun),
-                                 static_cast<double>(time.Milliseconds()) / 1000, options.output));
+                                 time.Seconds(), options.output));
     }
 }
 

@@ -31,8 +31,7 @@ struct ScanOptions {
 /// How a scan ended, as its summary says it.
 struct Ending {
     const char* how = "complete";
-    bool isShort = false;  ///< the instrument stopped before its time
-    std::uint64_t received = 0;
+    Service::ScanReport report;
     double seconds = 0;
 };
 
@@ -77,7 +76,7 @@ void PrintSummary(Session& session, const ScanOptions& options, const std::strin
     session.Print({{"identifier", identifier},
                    {"records", output.Records()},
                    {"recordSize", options.recordSize},
-                   {"bytes", ending.received},
+                   {"bytes", ending.report.received},
                    {"seconds", ending.seconds},
                    {"file", Json::OrNull(file)},
                    {"ended", ending.how}});
@@ -88,21 +87,15 @@ void ScanInto(RecordOutput& output, Session& session, Service::OpenedInstrument&
               const ScanOptions& options, std::uint32_t total, Ending& ending) {
     PrepareMeasurement(instrument, options.measurement.Settings());
     Service::ElapsedTime time;
-    Service::ScanReport report;
-    const auto note = [&] {
-        ending.received = report.received;
-        ending.seconds = static_cast<double>(time.Milliseconds()) / 1000;
-    };
     RecordWriter writer({options.recordSize, options.raw, options.header, {options.number, options.time}},
                         output);
     try {
-        RunScan(instrument, {options.recordSize, total, options.timeout}, writer, report);
+        RunScan(instrument, {options.recordSize, total, options.timeout}, writer, ending.report);
     } catch (...) {
-        note();
-        ending.isShort = report.hasStoppedEarly;
+        ending.seconds = time.Seconds();
         throw;
     }
-    if (const auto& rest = report.leftOver; !rest.empty()) {
+    if (const auto& rest = ending.report.leftOver; !rest.empty()) {
         if (options.raw) {
             output.Append({reinterpret_cast<const char*>(rest.data()), rest.size()}, 0);
         } else {
@@ -110,7 +103,7 @@ void ScanInto(RecordOutput& output, Session& session, Service::OpenedInstrument&
         }
     }
     output.Complete();
-    note();
+    ending.seconds = time.Seconds();
 }
 
 void CheckForm(const ScanOptions& options) {
@@ -139,7 +132,7 @@ void Scan(Session& session, const ScanOptions& options) {
     } catch (...) {
         const EarlyEnd end = EndEarly(session, *output, RecordNoun, options.discard);
         if (options.json && !identifier.empty()) {
-            ending.how = ending.isShort ? "short" : NameOf(ExitCodeOf(end.failure.Kind()));
+            ending.how = ending.report.hasStoppedEarly ? "short" : NameOf(ExitCodeOf(end.failure.Kind()));
             PrintSummary(session, options, identifier, *output, ending, end.file);
         }
         throw Failure(end.failure);
@@ -147,7 +140,8 @@ void Scan(Session& session, const ScanOptions& options) {
     if (options.json) {
         PrintSummary(session, options, identifier, *output, ending, options.output);
     } else {
-        const double rate = ending.seconds > 0 ? static_cast<double>(ending.received) / ending.seconds : 0;
+        const double rate =
+            ending.seconds > 0 ? static_cast<double>(ending.report.received) / ending.seconds : 0;
         session.Note(fmt::format("{} of {} bytes in {:.3f} s{}{}", CountText(output->Records(), RecordNoun),
                                  options.recordSize, ending.seconds,
                                  rate > 0 ? ", " + SizeText(rate) + "/s" : "",

@@ -16,6 +16,7 @@ class ElapsedTime final {
         last_ = now;
         return elapsed_;
     }
+    double Seconds() { return static_cast<double>(Milliseconds()) / 1000; }
 
   private:
     std::uint32_t last_ = Platform::TickCount();

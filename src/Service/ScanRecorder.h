@@ -1,11 +1,11 @@
 #pragma once
 
 #include <exception>
-#include <functional>
 #include <vector>
 
 #include "DeviceDriver/Ostra/LowLevel/ScanReceiver.h"
 #include "Service/ElapsedTime.h"
+#include "Service/Observer.h"
 
 namespace Varnholt::Service {
 
@@ -18,23 +18,28 @@ class RecordSink {
     virtual void TakeRecords(std::span<const std::uint8_t> records, std::uint64_t milliseconds) = 0;
 };
 
+/// How far a scan came.
+struct ScanReport {
+    std::uint64_t received = 0;          ///< bytes
+    std::vector<std::uint8_t> leftOver;  ///< behind the last whole record
+    bool hasStoppedEarly = false;        ///< the instrument has, before the total was there
+};
+
 /// Puts together the records of a scan from its transfers and passes them on as they arrive. Holds no more
 /// than one transfer.
 class ScanRecorder final : public DeviceDriver::Ostra::LowLevel::ScanReceiver {
   public:
-    /// `recordSink` outlives the object. `arrived` is called with the bytes of the scan that came so far,
-    /// each time when some more have been passed on.
-    ScanRecorder(std::uint32_t recordSize, RecordSink& recordSink,
-                 std::function<void(std::uint64_t bytes)> arrived);
+    /// What is referred to outlives the object. The report says what has come, and the progress is told, each
+    /// time when some more has been passed on.
+    ScanRecorder(std::uint32_t recordSize, RecordSink& recordSink, ScanReport& scanReport,
+                 Progress& scanProgress)
+        : recordSize_(recordSize), sink_(recordSink), report_(scanReport), progress_(scanProgress) {}
 
     void Receive(std::span<const std::uint8_t> data) override;
 
     /// What ended the scan on this side, such as a failure of the output: the library passes on its text
     /// alone. Null: nothing did.
     const std::exception_ptr& Failure() const { return failure_; }
-    std::uint64_t Received() const { return received_; }
-    /// Bytes behind the last whole record.
-    std::span<const std::uint8_t> LeftOver() const { return begun_; }
 
   private:
     void Take(std::span<const std::uint8_t> data);
@@ -42,12 +47,11 @@ class ScanRecorder final : public DeviceDriver::Ostra::LowLevel::ScanReceiver {
 
     const std::uint32_t recordSize_;
     RecordSink& sink_;
-    const std::function<void(std::uint64_t bytes)> progress_;
+    ScanReport& report_;  ///< its rest is a record that is not whole yet
+    Progress& progress_;
     ElapsedTime time_;
     std::uint64_t milliseconds_ = 0;  ///< when the transfer came
-    std::uint64_t received_ = 0;
     std::exception_ptr failure_;
-    std::vector<std::uint8_t> begun_;  ///< a record that is not whole yet
 };
 
 }  // namespace Varnholt::Service

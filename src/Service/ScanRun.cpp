@@ -30,7 +30,8 @@ bool IsShortfall(const std::exception_ptr& failure) {
 }
 
 /// To the end of the scan, or until less comes than should.
-void Stream(OpenedInstrument& instrument, const ScanSettings& settings, ScanRecorder& recorder) {
+void Stream(OpenedInstrument& instrument, const ScanSettings& settings, ScanRecorder& recorder,
+            const ScanReport& report) {
     std::exception_ptr failure;
     instrument.Do([&](const Commands& commands) {
         commands->SetScanReceiver(&recorder);
@@ -42,7 +43,7 @@ void Stream(OpenedInstrument& instrument, const ScanSettings& settings, ScanReco
         commands->SetScanReceiver(nullptr);
     });
     // A transfer that was aborted can look like one with which the instrument has stopped.
-    const bool isComplete = failure == nullptr && settings.total > 0 && recorder.Received() == settings.total;
+    const bool isComplete = failure == nullptr && settings.total > 0 && report.received == settings.total;
     if (instrument.UsedContext().UserInterruption().IsRequested() && !isComplete) {
         EndStream(instrument);
         throw Failure(FailureKind::Interrupted, "scan interrupted").Of(instrument.Identifier());
@@ -61,19 +62,9 @@ void Stream(OpenedInstrument& instrument, const ScanSettings& settings, ScanReco
 void RunScan(OpenedInstrument& instrument, const ScanSettings& settings, RecordSink& sink,
              ScanReport& report) {
     const auto progress = instrument.UsedContext().Told().StartProgress("scanning", settings.total, "B");
-    ScanRecorder recorder(settings.recordSize, sink,
-                          [&progress](std::uint64_t bytes) { progress->Update(bytes); });
-    const auto note = [&] {
-        report.received = recorder.Received();
-        report.leftOver.assign(recorder.LeftOver().begin(), recorder.LeftOver().end());
-    };
-    try {
-        Stream(instrument, settings, recorder);
-    } catch (...) {
-        note();
-        throw;
-    }
-    note();
+    report = {};
+    ScanRecorder recorder(settings.recordSize, sink, report, *progress);
+    Stream(instrument, settings, recorder, report);
     report.hasStoppedEarly = report.received < settings.total;
     if (report.hasStoppedEarly) {
         throw Failure(

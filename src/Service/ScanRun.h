@@ -1,7 +1,6 @@
 #pragma once
 
 #include <cstdint>
-#include <vector>
 
 #include "Protocol/Instrument.h"
 #include "Service/OpenedInstrument.h"
@@ -17,13 +16,6 @@ struct ScanSettings {
     /// driver drops a last record that is not whole.
     std::uint32_t total = 0;
     std::uint32_t timeout = 5;  ///< seconds that a transfer may take
-};
-
-/// How far a scan came.
-struct ScanReport {
-    std::uint64_t received = 0;          ///< bytes
-    std::vector<std::uint8_t> leftOver;  ///< behind the last whole record
-    bool hasStoppedEarly = false;        ///< the instrument has, before the total was there
 };
 
 /// Scans with an instrument that is prepared, until the total is there, the instrument stops, the sink fails
