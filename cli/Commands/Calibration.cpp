@@ -37,10 +37,7 @@ void SetCalibration(Session& session, const SetCalibrationOptions& options) {
         [&assignments](const EepromImage& image) { return WithCalibration(image, assignments); });
     Rows changes({{"ID", "id", Table::Align::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}});
     for (const ValueChange& change : edited.changes) {
-        changes.Add({change.id,
-                     {TextOf(change.before), Json(change.before)},
-                     "->",
-                     {TextOf(change.after), Json(change.after)}});
+        changes.Add({change.id, CellOf(change.before), "->", CellOf(change.after)});
     }
     target.Change(edited.image, options.change, Granularity::Elements, {{"changes", changes.AsJson()}},
                   [&] { changes.Print(session.Out()); });

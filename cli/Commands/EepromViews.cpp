@@ -119,24 +119,15 @@ struct DiffOptions {
     std::string a;
 };
 
-std::string TextOfSide(const std::optional<Property>& value, bool isWord) {
+Rows::Cell CellOfSide(const std::optional<Property>& value, bool isWord) {
     if (!value) {
-        return "(none)";
+        return {"(none)", Json()};
     }
-    if (isWord) {
-        return fmt::format("0x{:08X}", static_cast<std::uint32_t>(value->AsLong()));
-    }
-    return TextOf(*value);
+    return isWord ? CellOfWord(static_cast<std::uint32_t>(value->AsLong())) : CellOf(*value);
 }
 
-Json JsonOfSide(const std::optional<Property>& value, bool isWord) {
-    if (!value) {
-        return {};
-    }
-    return isWord ? Json(static_cast<std::uint32_t>(value->AsLong())) : Json(*value);
-}
-
-std::string TextOfDifference(const ImageDiff::Value& value) {
+std::string TextOfDifference(const ImageDiff::Value& value, const std::string& textOfA,
+                             const std::string& textOfB) {
     if (value.a && value.b && IsLongVector(*value.a) && IsLongVector(*value.b)) {
         const std::vector<double> a = NumbersOf(*value.a);
         const std::vector<double> b = NumbersOf(*value.b);
@@ -152,8 +143,7 @@ std::string TextOfDifference(const ImageDiff::Value& value) {
                                a[first], b[first]);
         }
     }
-    const bool isWord = value.kind == "word";
-    return TextOfSide(value.a, isWord) + " -> " + TextOfSide(value.b, isWord);
+    return textOfA + " -> " + textOfB;
 }
 
 /// Which of the two has no values, and why; empty where both have.
@@ -175,11 +165,9 @@ Rows RowsOf(const std::vector<ImageDiff::Value>& values) {
                {"", "b", Table::Align::Left, false}});
     for (const ImageDiff::Value& value : values) {
         const bool isWord = value.kind == "word";
-        rows.Add({value.kind,
-                  value.id,
-                  TextOfDifference(value),
-                  {"", JsonOfSide(value.a, isWord)},
-                  {"", JsonOfSide(value.b, isWord)}});
+        const Rows::Cell a = CellOfSide(value.a, isWord);
+        const Rows::Cell b = CellOfSide(value.b, isWord);
+        rows.Add({value.kind, value.id, TextOfDifference(value, a.text, b.text), a, b});
     }
     return rows;
 }

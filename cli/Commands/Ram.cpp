@@ -61,9 +61,8 @@ void SetRam(Session& session, const SetRamOptions& options) {
     Rows changes(
         {{"ID", "id", Table::Align::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}, {"MEANING"}});
     for (const std::uint16_t id : ParametersToShow(assignments, before, set)) {
-        const Property& old = before.GetProperty(id);
-        const Property& now = set.GetProperty(id);
-        changes.Add({id, {TextOf(old), Json(old)}, "->", {TextOf(now), Json(now)}, MeaningOfParameter(id)});
+        changes.Add(
+            {id, CellOf(before.GetProperty(id)), "->", CellOf(set.GetProperty(id)), MeaningOfParameter(id)});
     }
     if (options.json) {
         session.Print({{"identifier", instrument.Identifier()},

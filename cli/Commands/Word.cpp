@@ -1,5 +1,3 @@
-#include <fmt/format.h>
-
 #include <limits>
 
 #include "Commands/AllCommands.h"
@@ -7,6 +5,7 @@
 #include "Memory/MemoryTarget.h"
 #include "Output/Json.h"
 #include "Output/Rows.h"
+#include "Output/ValueList.h"
 #include "Protocol/PropertyIdentifiers.h"
 #include "Service/Memory/ImageEdit.h"
 #include "Service/Number.h"
@@ -34,7 +33,7 @@ void GetWord(Session& session, const GetWordOptions& options) {
     for (const std::uint16_t id : ids) {
         const std::uint32_t word = RawWordOf(target.Image(), id);
         words.Add(std::to_string(id), word);
-        table.AddRow({std::to_string(id), fmt::format("0x{:08X}", word), std::to_string(word)});
+        table.AddRow({std::to_string(id), CellOfWord(word).text, std::to_string(word)});
     }
     if (options.memory.json) {
         session.Print({{"source", target.Name()}, {"words", words}});
@@ -66,13 +65,10 @@ void PutWord(Session& session, const PutWordOptions& options) {
     MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
     EepromImage edited = target.Image();
     Rows changes({{"ID", "id", Table::Align::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}});
-    const auto cell = [](std::uint32_t word) {
-        return Rows::Cell(fmt::format("0x{:08X}", word), Json(word));
-    };
     for (const Word& word : words) {
         const std::uint32_t before = RawWordOf(edited, word.id);
         SetRawWord(edited, word.id, word.value);
-        changes.Add({word.id, cell(before), "->", cell(word.value)});
+        changes.Add({word.id, CellOfWord(before), "->", CellOfWord(word.value)});
     }
     target.Change(edited, options.change, Granularity::Elements, {{"changes", changes.AsJson()}},
                   [&] { changes.Print(session.Out()); });

@@ -5,7 +5,6 @@
 
 #include <algorithm>
 
-#include "Output/Table.h"
 #include "Service/Memory/PropertyText.h"
 
 namespace Varnholt::Cli {
@@ -29,6 +28,14 @@ void PrintNumbers(std::ostream& out, const std::vector<double>& numbers) {
 }
 
 }  // namespace
+
+Rows::Cell CellOf(const Property& value) {
+    return {TextOf(value), Json(value)};
+}
+
+Rows::Cell CellOfWord(std::uint32_t word) {
+    return {fmt::format("0x{:08X}", word), Json(word)};
+}
 
 void PrintValues(Session& session, const Properties& values, Vectors vectors) {
     Table table({{"ID", Table::Align::Right}, {"VALUE"}});
