@@ -100,7 +100,7 @@ function(ostra_test NAME)
   cmake_parse_arguments(ARG "WAITS_LONG;ONE_THREAD" "" "SOURCES;LINK;EXACT_TIME" ${ARGN})
   ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest $<$<TARGET_EXISTS:ostra_virtual_time>:ostra_virtual_time>)
   target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
-  set_target_properties(${NAME} PROPERTIES OSTRA_IS_TEST ON UNITY_BUILD OFF)  # tests name their fixtures as they like
+  set_target_properties(${NAME} PROPERTIES OSTRA_IS_TEST ON)
   target_compile_options(${NAME} PRIVATE -O0)  # as compiling it takes longer than running it
   if(ARG_ONE_THREAD AND OSTRA_SANITIZE STREQUAL "thread")
     set_target_properties(${NAME} PROPERTIES EXCLUDE_FROM_ALL ON)

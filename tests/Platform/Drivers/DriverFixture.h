@@ -12,11 +12,14 @@
 #include "Platform/TestThread.h"
 #include "Platform/WaitableObjects.h"
 #include "Protocol/ByteOrder.h"
+#include "Protocol/Instrument.h"
 #include "Protocol/NativeDriver.h"
 #include "Protocol/UsbIoDriver.h"
 #include "Support/HookedUsb.h"
 
 namespace Varnholt::Tests {
+
+inline constexpr std::uint8_t In = Protocol::BulkInEndpoint;
 
 /// How a request ended.
 struct Outcome {

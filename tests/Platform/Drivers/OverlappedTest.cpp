@@ -14,7 +14,6 @@ namespace Errors = Platform::Errors;
 namespace Native = Protocol::NativeDriver;
 using namespace Platform;
 
-constexpr std::uint8_t In = Protocol::BulkInEndpoint;
 constexpr std::uint8_t Interrupt = Protocol::InterruptInEndpoint;
 
 /// What holds for every file, whichever driver stands behind it.

@@ -9,7 +9,6 @@ namespace Errors = Platform::Errors;
 namespace Code = Protocol::UsbIoDriver::Control;
 namespace Status = Protocol::UsbIoDriver::Status;
 
-constexpr std::uint8_t In = Protocol::BulkInEndpoint;
 constexpr std::uint8_t Out = Protocol::BulkOutEndpoint;
 
 /// A device control on one of several files, and its status.

@@ -28,10 +28,6 @@ const std::string LogWrites =
     "write 0+256 write 256+256 write 512+256 write 768+256 write 1024+40 "
     "write 2048+256 write 2304+256 write 2560+256 write 2816+256 write 3072+40";
 
-Property Long(std::int32_t value) {
-    return Property(value);
-}
-
 class EepromTest : public testing::Test {
   protected:
     void Load() {
@@ -41,13 +37,13 @@ class EepromTest : public testing::Test {
     void Store(const Changes& values) {
         set_ = Properties();
         for (const auto& [id, value] : values) {
-            set_.SetProperty(id, Long(value));
+            set_.SetProperty(id, Property(value));
         }
         eeprom_->Store(set_);
     }
     void ChangeLog(int times) {
         for (int change = 1; change <= times; ++change) {
-            eeprom_->SetProperty(10002, Long(change));
+            eeprom_->SetProperty(10002, Property(change));
         }
     }
     void ExpectLocked() {
@@ -99,13 +95,13 @@ TEST_F(EepromTest, LoadFillsSetsByNameOrByIdentifier) {
     Properties other("calibrationdata");
     EXPECT_EQ(eeprom_->Load(other).GetItemCount(), 0U);
     Properties some("CalibrationData");
-    some.SetProperty(2005, Long(7));
+    some.SetProperty(2005, Property(7));
     some.SetProperty(3009, Property());
     eeprom_->Load(some);
     EXPECT_EQ(some.GetItemCount(), 2U);
     EXPECT_EQ(some.GetProperty(2005).AsLong(), 7);
     EXPECT_EQ(some.GetProperty(3009).AsLongVector(), (Longs{-1, -1}));
-    some.SetProperty(20001, Long(1));
+    some.SetProperty(20001, Property(1));
     ExpectThrow<ResourceException>("unknown property id = 20001", [&] { eeprom_->Load(some); });
 }
 
@@ -244,7 +240,7 @@ TEST_F(EepromTest, LogThatHasGrownBeyondItsAreaIsRefusedAsLongAsItIs) {
             ExpectThrow<ResourceException>(tooSmall, [&] { eeprom_->Dump(); });
         }
         if (fitsAnImage) {
-            eeprom_->GetLog().SetItem(10021, Long(1));
+            eeprom_->GetLog().SetItem(10021, Property(1));
         }
         eeprom_.reset();
         ExpectCommands(fitsAnImage ? LogWrites : "");

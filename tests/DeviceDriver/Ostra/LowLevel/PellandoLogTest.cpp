@@ -22,10 +22,6 @@ using Longs = std::vector<std::int32_t>;
 constexpr std::size_t MainCopy = 0;
 constexpr std::size_t SecondCopy = 2048;
 
-Property Long(std::int32_t value) {
-    return Property(value);
-}
-
 class LogTest : public testing::Test {
   protected:
     LogTest() { table_.InitializeEmtpyEAT(); }
@@ -43,7 +39,7 @@ TEST_F(LogTest, ChecksumAddsIntegersAndBitPatternsModulo32Bits) {
         {"a float's bit pattern", 10001, Property(-2.0F), 0xC0000000},
         {"every element of a vector", 10010, Property(Longs(128, 3)), 384},
         {"a sum that wraps", 10011, Property(Longs{-1, 4}), 3},
-        {"not the checksum itself", 10000, Long(77), 0},
+        {"not the checksum itself", 10000, Property(77), 0},
     };
     std::uint32_t all = 0;
     PellandoLog together = Read();
@@ -85,7 +81,7 @@ TEST_F(LogTest, DumpIsRecommendedAfterTwentyChangesOrTheLastWatchedItem) {
     PellandoLog counting = Read();
     for (int change = 1; change <= 20; ++change) {
         EXPECT_FALSE(counting.IsDumpRecommended()) << change;
-        counting.SetItem(10002, Long(change));
+        counting.SetItem(10002, Property(change));
     }
     EXPECT_TRUE(counting.IsDumpRecommended());
     const std::vector<std::uint16_t> watched{10010, 10011, 10012, 10013, 10020, 10021};
@@ -112,8 +108,8 @@ TEST_F(LogTest, DumpIsRecommendedAfterTwentyChangesOrTheLastWatchedItem) {
 
 TEST_F(LogTest, DumpWritesValuesWithAFreshChecksumFirst) {
     PellandoLog log = Read();
-    log.SetItem(10002, Long(0x01020304));
-    log.SetItem(10021, Long(-2));
+    log.SetItem(10002, Property(0x01020304));
+    log.SetItem(10021, Property(-2));
     log.Dump(dumped_.begin(), dumped_.end());
     Store(0, 0x01020302);
     Store(8, 0x01020304);
@@ -125,7 +121,7 @@ TEST_F(LogTest, DumpWritesValuesWithAFreshChecksumFirst) {
 
 TEST_F(LogTest, IncrementAddsToWhatIsThere) {
     PellandoLog log = Read();
-    log.SetItem(10003, Long(std::numeric_limits<std::int32_t>::max()));
+    log.SetItem(10003, Property(std::numeric_limits<std::int32_t>::max()));
     log.Increment(10003, std::int32_t{2});
     EXPECT_EQ(log.GetItem(10003).AsLong(), std::numeric_limits<std::int32_t>::min() + 1);
     log.SetItem(10001, Property(1.0F));

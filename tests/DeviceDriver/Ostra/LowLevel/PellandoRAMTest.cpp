@@ -24,10 +24,6 @@ using Answers = std::array<std::uint8_t, 6>;
 constexpr float Infinity = std::numeric_limits<float>::infinity();
 constexpr float NotANumber = std::numeric_limits<float>::quiet_NaN();
 
-Property Long(std::int32_t value) {
-    return Property(value);
-}
-
 /// The entries in their order: "2013=300 2016=0.5".
 std::string Text(const Properties& set) {
     std::ostringstream text;
@@ -46,12 +42,12 @@ class RamTest : public testing::Test {
   protected:
     RamTest() {
         instrument_.misc2 = 300;
-        set_.SetProperty(2013, Long(300));
+        set_.SetProperty(2013, Property(300));
         set_.SetProperty(2009, Property(0.068F));
         set_.SetProperty(2001, Property(0.0884F));
-        set_.SetProperty(2010, Long(100));
+        set_.SetProperty(2010, Property(100));
         for (const std::uint16_t id : std::vector<std::uint16_t>{2008, 2000, 2002, 2003}) {
-            set_.SetProperty(id, Long(0));
+            set_.SetProperty(id, Property(0));
         }
     }
 
@@ -100,8 +96,8 @@ TEST_F(RamTest, LoadsMeasurementParametersInSecondsAndFlags) {
 
 TEST_F(RamTest, LoadAsksOnlyForWhatIsWanted) {
     Properties set, empty;
-    set.SetProperty(1000, Long(3));
-    set.SetProperty(2005, Long(4));
+    set.SetProperty(1000, Property(3));
+    set.SetProperty(2005, Property(4));
     EXPECT_EQ(Text(ram_.Load(set)), "1000=3 2005=4");
     EXPECT_EQ(Text(ram_.Load(empty)), "");
     EXPECT_EQ(ram_.Load(2007).AsLong(), 0);
@@ -134,8 +130,9 @@ TEST_F(RamTest, StoresRoundedCountsTheThirdParameterAndFlags) {
     };
     const auto third = [](std::int32_t value, std::int32_t replacement, std::int32_t flag0,
                           const char* stored) {
-        return Case{
-            "third parameter", {{2010, Long(value)}, {9189, Long(replacement)}, {2008, Long(flag0)}}, stored};
+        return Case{"third parameter",
+                    {{2010, Property(value)}, {9189, Property(replacement)}, {2008, Property(flag0)}},
+                    stored};
     };
     const Case cases[] = {
         times("whole counts", 0.068F, 0.0884F, "1000 10 100 0"),
@@ -156,10 +153,10 @@ TEST_F(RamTest, StoresRoundedCountsTheThirdParameterAndFlags) {
         third(100, 1, 1, "1000 10 1 0"),
         third(100, 300, -7, "1000 10 300 0"),
         third(100, 300, 0, "1000 10 100 0"),
-        {"a flag", {{2008, Long(2)}}, "1000 10 100 1"},
-        {"a flag", {{2000, Long(2)}}, "1000 10 100 2"},
-        {"a flag", {{2002, Long(2)}}, "1000 10 100 4"},
-        {"a flag", {{2003, Long(2)}}, "1000 10 100 8"},
+        {"a flag", {{2008, Property(2)}}, "1000 10 100 1"},
+        {"a flag", {{2000, Property(2)}}, "1000 10 100 2"},
+        {"a flag", {{2002, Property(2)}}, "1000 10 100 4"},
+        {"a flag", {{2003, Property(2)}}, "1000 10 100 8"},
     };
     for (const Case& row : cases) {
         Properties set = set_;
@@ -179,7 +176,7 @@ TEST_F(RamTest, StoreNeedsAWholeSet) {
     for (const std::uint16_t id :
          std::vector<std::uint16_t>{9189, 2013, 2009, 2001, 2010, 2008, 2000, 2002, 2003}) {
         Properties set = set_;
-        set.SetProperty(2008, Long(id == 9189 ? 1 : 0));
+        set.SetProperty(2008, Property(id == 9189 ? 1 : 0));
         set.GetDatastore().remove_if([id](const auto& entry) { return entry.first == id; });
         if (id == 9189) {  // which it can do without
             ram_.Store(set);
@@ -191,8 +188,8 @@ TEST_F(RamTest, StoreNeedsAWholeSet) {
         }
     }
     ExpectThrow<ResourceException>("id 2013 doesn't exist", [&] { ram_.Store(2009, Property(0.1F)); });
-    ram_.Store(2013, Long(1));
-    ram_.Store(1211, Long(1));
+    ram_.Store(2013, Property(1));
+    ram_.Store(1211, Property(1));
     EXPECT_EQ(instrument_.TakeCommands(), "");
 }
 
@@ -217,7 +214,7 @@ class ModeSearch : public RamTest {
     ModeSearch() {
         instrument_.misc2 = 301;
         instrument_.describeMode = &Three;
-        set_.SetProperty(2013, Long(301));
+        set_.SetProperty(2013, Property(301));
     }
     void Store(float seconds) {
         set_.SetProperty(2009, Property(seconds));
@@ -288,12 +285,12 @@ TEST_F(ModeSearch, UsesTheModesFactorForTheSecondTime) {
     EXPECT_FLOAT_EQ(ram_.Load(2001).AsFloat(), 0.008F);
     Store(0.068F);
     EXPECT_TRUE(ram_.IsInPerfectMode());
-    set_.SetProperty(2013, Long(300));
+    set_.SetProperty(2013, Property(300));
     set_.SetProperty(2001, Property(0.0265F));
     Store(0.068F);
     EXPECT_EQ(instrument_.p2, 3U) << "an instrument without modes has the time base of construction";
     EXPECT_FALSE(ram_.IsInPerfectMode());
-    set_.SetProperty(2013, Long(301));
+    set_.SetProperty(2013, Property(301));
     instrument_.describeMode = [](std::uint8_t mode) { return Answers{3, mode, 0, 0, 68, 1}; };
     Store(0.068F);
     EXPECT_EQ(instrument_.p2, 0xFFFF) << "a factor of nothing";

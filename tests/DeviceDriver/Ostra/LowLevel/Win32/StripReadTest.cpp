@@ -65,7 +65,7 @@ Answer Claims(std::size_t bytes, std::uint32_t claimed) {
     return {.data = Bytes(bytes), .count = claimed};
 }
 const Answer Stuck{.after = Never, .cancelledAfter = 5};
-const Answer Gone = Fails(Errors::DeviceNotConnected), Refused{.refusal = Errors::DeviceNotConnected};
+const Answer GoneAtOnce = Fails(Errors::DeviceNotConnected), Refused{.refusal = Errors::DeviceNotConnected};
 
 struct StripCase {
     const char* name;
@@ -99,7 +99,7 @@ const StripCase StripCases[] = {
     {"late", 5, 0, {Data(10, 3999), Data(50, 7998), Data(5, 7998)}, "10 50 50 50 50 x", 65, "", 11997},
     {"fails when the first is late", 5, 0, {}, "10 50 x", 0, Failed, Limit},
     {"keeps the records before a failure", 5, 0, {Data(10)}, "10 50 50 x", 10, Failed, Limit},
-    {"fails with a transfer", 5, 0, {Data(10), Gone}, "10 50 50 x", 10, Failed},
+    {"fails with a transfer", 5, 0, {Data(10), GoneAtOnce}, "10 50 50 x", 10, Failed},
     {"fails with one that does not start", 5, 0, {Data(10), Refused}, "10 50 50 x", 10, Failed},
     {"refuses broken records", 5, 0, {Data(10), Data(49)}, "10 50 50 x", 10, WrongSize},
     {"refuses a broken first record", 5, 0, {Data(4)}, "10 50 x", 0, WrongSize},
@@ -120,7 +120,7 @@ const StripCase StripCases[] = {
     {"counted, in the last moment", 5, 100, {Data(50, 3999), Data(50, 3998)}, "50 50", 100, "", 3999},
     {"counted, 2nd alone", 5, 100, {Stuck, Data(50, 3000)}, "50 50 x", 0, BusyFailed(0, 50, 0), Limit + 5},
     {"counted, late", 5, 120, {Data(50)}, "50 50 20 x", 50, BusyFailed(0, 50, 0), Limit},
-    {"counted, failed", 5, 170, {Gone}, "50 50 x", 0, BusyFailed(0, 50, 70)},
+    {"counted, failed", 5, 170, {GoneAtOnce}, "50 50 x", 0, BusyFailed(0, 50, 70)},
     {"counted, half way", 5, 50, {Fails(31, 7)}, "50", 0, BusyFailed(7, 50, 0)},
     {"counted, short", 5, 120, {Data(50), Data(45)}, "50 50 20 x", 50, Busy("wrong data size", 45, 50, 0)},
     {"counted, too large a record", 6554, 10, {}, "", 0, TooLarge},
