@@ -32,10 +32,12 @@ constexpr auto ClaimRetryPause = std::chrono::milliseconds(20);
 /// What a transfer needs while it is under way: libusb's record, and for control transfers the buffer with
 /// the setup bytes in front. Used again and again.
 struct Submission {
+    explicit Submission(class LibUsbDevice* submitter) : device(submitter) {}
+
     class LibUsbDevice* device;
     std::unique_ptr<libusb_transfer, ReleasedBy<libusb_free_transfer>> transfer{libusb_alloc_transfer(0)};
     Transfer* owner = nullptr;  ///< null: free for the next
-    std::vector<std::uint8_t> controlBuffer{};
+    std::vector<std::uint8_t> controlBuffer;
 };
 
 using Context = std::unique_ptr<libusb_context, ReleasedBy<libusb_exit>>;
