@@ -139,7 +139,8 @@ TEST(ImageEditTest, RefusesWhatItCannotProve) {
     };
     const EepromImage calibration = moved(Map::Calibration, 8192, 6000);
     ASSERT_EQ(ImageModel(calibration).Get().GetProperty(1211).AsLong(), 77);
-    FailureOf([&] { WithCalibration(calibration, {{1211, "5"}}); }, FailureKind::BadData);
+    // Even the value that is there would be written in a place that is not the calibration's.
+    FailureOf([&] { WithCalibration(calibration, {{1211, "77"}}); }, FailureKind::BadData);
     for (const std::uint32_t copy : {0U, 2048U}) {
         FailureOf([&] { WithEmptyLog(moved(copy, copy + 2048, 5000)); }, FailureKind::BadData);
     }
