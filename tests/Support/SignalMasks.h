@@ -21,11 +21,16 @@ inline std::map<std::string, std::uint64_t> MasksOfOtherThreads() {
     for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {
         std::ifstream status(task.path() / "status");
         std::string word;
+        while (status >> word && word != "Threads:") {
+        }
+        int threads = 0;
+        status >> threads;
         while (status >> word && word != "SigBlk:") {
         }
         std::uint64_t mask = 0;
-        // A thread that ends meanwhile has no status any more.
-        if (task.path().filename() != std::to_string(gettid()) && status >> std::hex >> mask) {
+        // A thread that ends meanwhile has no status any more, or one that counts no threads and tells no
+        // mask.
+        if (task.path().filename() != std::to_string(gettid()) && status >> std::hex >> mask && threads > 0) {
             masks[task.path().filename()] = mask;
         }
     }
