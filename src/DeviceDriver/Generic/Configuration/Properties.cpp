@@ -2,15 +2,13 @@
 
 #include <algorithm>
 
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Generic/Utilities/EndianConversion.h"
-#include "Utilities/Exceptions/Exceptions.h"
 #include "Utilities/Exceptions/Trace.h"
 
 namespace Varnholt::DeviceDriver::Generic::Configuration {
 
 namespace EndianConversion = Utilities::EndianConversion;
-using Varnholt::Utilities::Exceptions::Here;
-using Varnholt::Utilities::Exceptions::ResourceException;
 
 namespace {
 

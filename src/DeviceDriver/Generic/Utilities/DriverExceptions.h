@@ -53,3 +53,15 @@ class TimeoutException final : public DeviceDriverException {
 };
 
 }  // namespace Varnholt::DeviceDriver::Generic::Utilities
+
+/// What the whole driver throws with.
+namespace Varnholt::DeviceDriver {
+using Generic::Utilities::DataException;
+using Generic::Utilities::IOException;
+using Generic::Utilities::Shortfall;
+using Generic::Utilities::TimeoutException;
+using Varnholt::Utilities::Exceptions::Here;
+using Varnholt::Utilities::Exceptions::ResourceException;
+using Varnholt::Utilities::Exceptions::RuntimeException;
+using Varnholt::Utilities::Exceptions::SourceLocation;
+}  // namespace Varnholt::DeviceDriver

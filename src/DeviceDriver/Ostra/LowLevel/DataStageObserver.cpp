@@ -3,15 +3,13 @@
 #include <string>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
-#include "Utilities/Exceptions/Location.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 void WholeDataStages::DataStageEnded(std::uint32_t asked, std::uint32_t moved) {
     if (moved != asked) {
-        throw Generic::Utilities::IOException(
-            std::to_string(moved) + " of " + std::to_string(asked) + " bytes came",
-            Varnholt::Utilities::Exceptions::Here(), Generic::Utilities::Shortfall{moved, asked});
+        throw IOException(std::to_string(moved) + " of " + std::to_string(asked) + " bytes came", Here(),
+                          Shortfall{moved, asked});
     }
 }
 

@@ -20,10 +20,6 @@ namespace EepromMap = Protocol::EepromMap;
 namespace TableLayout = Protocol::EepromMap::TableLayout;
 namespace EndianConversion = Generic::Utilities::EndianConversion;
 using namespace Generic::Configuration;
-using Generic::Utilities::DataException;
-using Varnholt::Utilities::Exceptions::Here;
-using Varnholt::Utilities::Exceptions::ResourceException;
-using Varnholt::Utilities::Exceptions::SourceLocation;
 
 namespace {
 

@@ -5,6 +5,7 @@
 #include <string>
 #include <utility>
 
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
 #include "DeviceDriver/Ostra/LowLevel/SectionReader.h"
 #include "Protocol/EepromMap.h"
@@ -16,9 +17,6 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace EepromMap = Protocol::EepromMap;
 namespace PropertyIds = Protocol::PropertyIds;
 using namespace Generic::Configuration;
-using Varnholt::Utilities::Exceptions::Here;
-using Varnholt::Utilities::Exceptions::ResourceException;
-using Varnholt::Utilities::Exceptions::RuntimeException;
 using Varnholt::Utilities::Tools::SmartPointer;
 using Bytes = std::vector<std::uint8_t>;
 

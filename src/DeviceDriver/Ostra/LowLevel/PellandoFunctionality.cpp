@@ -2,15 +2,14 @@
 
 #include <algorithm>
 
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Generic/Utilities/EndianConversion.h"
 #include "Protocol/Instrument.h"
-#include "Utilities/Exceptions/Exceptions.h"
 #include "Utilities/Exceptions/Trace.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace {
 
-using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Exceptions::InvalidArgumentException;
 namespace EndianConversion = Generic::Utilities::EndianConversion;
 

@@ -5,6 +5,7 @@
 #include <initializer_list>
 #include <limits>
 
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
 #include "Protocol/PropertyIdentifiers.h"
 #include "Utilities/Exceptions/Trace.h"
@@ -13,8 +14,6 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 using namespace Generic::Configuration;
 using namespace Protocol::PropertyIds;
-using Varnholt::Utilities::Exceptions::Here;
-using Varnholt::Utilities::Exceptions::ResourceException;
 using Varnholt::Utilities::Tools::SmartPointer;
 
 namespace {

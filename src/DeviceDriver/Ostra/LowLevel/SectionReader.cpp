@@ -13,8 +13,6 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 using Generic::Configuration::Properties;
 using Generic::Configuration::Property;
-using Generic::Utilities::DataException;
-using Varnholt::Utilities::Exceptions::Here;
 
 namespace {
 

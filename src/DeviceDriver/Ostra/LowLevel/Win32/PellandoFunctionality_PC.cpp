@@ -11,16 +11,13 @@
 #include "Platform/ErrorCodes.h"
 #include "Platform/ScopedThreadPriority.h"
 #include "Protocol/ByteOrder.h"
-#include "Utilities/Exceptions/Location.h"
 #include "Utilities/Exceptions/Trace.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 namespace DataStage = Protocol::DataStage;
 namespace NativeDriver = Protocol::NativeDriver;
-using Generic::Utilities::IOException;
 using Protocol::Request;
-using Varnholt::Utilities::Exceptions::Here;
 
 namespace {
 

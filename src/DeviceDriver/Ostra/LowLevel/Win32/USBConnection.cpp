@@ -5,19 +5,14 @@
 #include "Platform/DeviceFiles.h"
 #include "Platform/Threads.h"
 #include "Platform/WaitableObjects.h"
-#include "Utilities/Exceptions/Location.h"
 #include "Utilities/Exceptions/Trace.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace {
 
-using Generic::Utilities::IOException;
-using Generic::Utilities::Shortfall;
-using Generic::Utilities::TimeoutException;
 using Platform::NoHandle;
 using Platform::OverlappedRequest;
 using Platform::WaitResult;
-using Varnholt::Utilities::Exceptions::Here;
 
 constexpr std::uint32_t ControlWaitLimit = 2000;
 constexpr std::uint32_t TransferGrace = 5000;  ///< what a transfer gets beyond its time-out
