@@ -1,5 +1,6 @@
 #include "DeviceDriver/Ostra/LowLevel/InterruptWatch.h"
 
+#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Platform/Threads.h"
 #include "Utilities/Multithreading/ScopedLock.h"
 
@@ -32,42 +33,25 @@ void InterruptWatch::SetReceiver(std::shared_ptr<EventListener> receiver) {
     listener_.swap(receiver);
 }
 
-bool InterruptWatch::IsTouched() {
-    const ScopedLock held(lock_);
-    return touched_;
-}
-
-InterruptWatch::State InterruptWatch::GetState() {
-    const ScopedLock held(lock_);
-    return state_;
-}
-
-bool InterruptWatch::IsOwnThread() {
-    const ScopedLock held(lock_);
-    return threadId_ == std::this_thread::get_id();
-}
-
-bool InterruptWatch::WasEndedByForce() {
-    const ScopedLock held(lock_);
-    return endedByForce_;
-}
-
-Platform::OwnedHandle InterruptWatch::Launch() {
-    if (!HasEvents()) {
-        return {};
-    }
-    auto argument = std::make_unique<std::shared_ptr<InterruptWatch>>(shared_from_this());
-    const ScopedLock held(lock_);  // the thread finds its state set
-    Platform::OwnedHandle thread(Platform::StartThread(ThreadEntry, argument.get()));
+void InterruptWatch::Start(Platform::OwnedHandle& thread, const SourceLocation& caller) {
     if (thread) {
-        state_ = State::Running;
-        static_cast<void>(argument.release());  // the thread's
+        return;
     }
-    return thread;
-}
-
-bool InterruptWatch::AwaitStart() {
-    return Platform::Wait(started_.Get(), StartLimit) == WaitResult::Signalled;
+    if (HasEvents()) {
+        auto argument = std::make_unique<std::shared_ptr<InterruptWatch>>(shared_from_this());
+        const ScopedLock held(lock_);  // the thread finds its state set
+        thread = Platform::OwnedHandle(Platform::StartThread(ThreadEntry, argument.get()));
+        if (thread) {
+            state_ = State::Running;
+            static_cast<void>(argument.release());  // the thread's
+        }
+    }
+    if (!thread) {
+        throw IOException("could not create interrupt listener thread", Here(caller));
+    }
+    if (Platform::Wait(started_.Get(), StartLimit) != WaitResult::Signalled) {
+        throw IOException("interrupt listener thread had timeout", Here(caller));
+    }
 }
 
 void InterruptWatch::RequestStop() {
@@ -81,19 +65,19 @@ void InterruptWatch::RequestStop() {
 }
 
 bool InterruptWatch::End(Platform::OwnedHandle& thread) {
-    if (IsOwnThread()) {
+    if (threadId_ == std::this_thread::get_id()) {
         RequestStop();
         thread.Reset();
         return true;
     }
     bool ended = false;
-    for (int round = 0; round < StopRounds && !ended && GetState() != State::Ended; ++round) {
+    for (int round = 0; round < StopRounds && !ended && state_ != State::Ended; ++round) {
         RequestStop();
         Platform::SleepMilliseconds(0);
         ended = HasEnded(thread.Get(), StopRoundLimit);
     }
     if (!ended) {
-        if (GetState() != State::Ended) {
+        if (state_ != State::Ended) {
             ClosePipe();
         }
         ended = HasEnded(thread.Get(), StopRoundLimit) || EndByForce(thread.Get());
@@ -131,7 +115,7 @@ void InterruptWatch::Run() {
     }
     const ScopedLock held(lock_);
     state_ = State::Ended;
-    threadId_ = {};
+    threadId_ = std::thread::id();
 }
 
 void InterruptWatch::ReportStart() {

@@ -8,6 +8,7 @@
 #include "DeviceDriver/Generic/EventListener.h"
 #include "Platform/Handle.h"
 #include "Platform/WaitableObjects.h"
+#include "Utilities/Exceptions/SourceLocation.h"
 #include "Utilities/Multithreading/Mutex.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
@@ -28,12 +29,12 @@ class InterruptWatch : public std::enable_shared_from_this<InterruptWatch> {
     /// The thread keeps the receiver alive while it delivers.
     void SetReceiver(std::shared_ptr<Generic::EventListener> receiver);
     /// True once interrupt data have arrived.
-    bool IsTouched();
+    bool IsTouched() const { return touched_; }
 
-    /// Starts the thread; nothing when the system has none.
-    Platform::OwnedHandle Launch();
-    /// False when the thread does not report within 2000 ms; it may then still run and is to be ended.
-    bool AwaitStart();
+    /// Starts the thread where there is none, and returns when it has reported. `IOException` of the caller
+    /// when it cannot be made or does not report within 2000 ms; it may then still run and is to be ended.
+    void Start(Platform::OwnedHandle& thread, const Varnholt::Utilities::Exceptions::SourceLocation& caller =
+                                                  Varnholt::Utilities::Exceptions::SourceLocation::current());
     /// Ends the thread within 11 s, by force where it does not end, and lets go of it; from the thread
     /// itself, asks for the end only. False when not even force has helped: the thread is left to itself
     /// then.
@@ -54,7 +55,7 @@ class InterruptWatch : public std::enable_shared_from_this<InterruptWatch> {
     Platform::Handle Wake() const { return wake_.Get(); }
     const std::atomic<bool>& EndRequested() const { return endRequested_; }
     /// The thread runs no further instruction; it may hold locks of the derived class for ever.
-    bool WasEndedByForce();
+    bool WasEndedByForce() const { return endedByForce_; }
 
     /// Guards what the derived class shares between threads, too; nobody is called with it held.
     Varnholt::Utilities::Multithreading::Mutex lock_{""};
@@ -64,20 +65,18 @@ class InterruptWatch : public std::enable_shared_from_this<InterruptWatch> {
 
     static std::uint32_t ThreadEntry(void* argument);
     void Run();
-    State GetState();
-    bool IsOwnThread();
     void RequestStop();
     bool EndByForce(Platform::Handle thread);
 
     const Platform::OwnedHandle started_{Platform::MakeAutoResetEvent()};
     const Platform::OwnedHandle wake_{Platform::MakeAutoResetEvent()};
     std::atomic<bool> endRequested_ = false;
-    // Guarded by `lock`:
-    State state_ = State::Ended;
-    bool touched_ = false;
-    bool endedByForce_ = false;
-    std::shared_ptr<Generic::EventListener> listener_;
-    std::thread::id threadId_;
+    // Written under `lock_`:
+    std::atomic<State> state_ = State::Ended;
+    std::atomic<bool> touched_ = false;
+    std::atomic<bool> endedByForce_ = false;
+    std::atomic<std::thread::id> threadId_{};
+    std::shared_ptr<Generic::EventListener> listener_;  ///< and read
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

@@ -6,15 +6,12 @@
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/InterruptWatch.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
-#include "Utilities/Exceptions/Location.h"
 #include "Utilities/Exceptions/Trace.h"
 #include "Utilities/Multithreading/ScopedLock.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 using Generic::EventListener;
-using Generic::Utilities::IOException;
-using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Multithreading::ScopedLock;
 
 namespace {
@@ -90,18 +87,7 @@ TRACED
 bool InterruptListener::IsTouched() const try { return watch_->IsTouched(); }
 TRACED
 
-void InterruptListener::Start() try {
-    if (thread_) {
-        return;
-    }
-    thread_ = watch_->Launch();
-    if (!thread_) {
-        throw IOException("could not create interrupt listener thread", Here());
-    }
-    if (!watch_->AwaitStart()) {
-        throw IOException("interrupt listener thread had timeout", Here());
-    }
-}
+void InterruptListener::Start() try { watch_->Start(thread_); }
 TRACED
 
 void InterruptListener::Stop() try {

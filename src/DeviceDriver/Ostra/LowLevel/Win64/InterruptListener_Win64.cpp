@@ -2,9 +2,7 @@
 
 #include <list>
 
-#include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/InterruptWatch.h"
-#include "Utilities/Exceptions/Location.h"
 #include "Utilities/Exceptions/Trace.h"
 #include "Utilities/Multithreading/Mutex.h"
 #include "Utilities/Multithreading/ScopedLock.h"
@@ -13,9 +11,7 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 using namespace Protocol::UsbIoDriver;
 using Generic::EventListener;
-using Generic::Utilities::IOException;
 using UsbIo::CUsbIoPipe;
-using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Multithreading::Mutex;
 using Varnholt::Utilities::Multithreading::ScopedLock;
 using Varnholt::Utilities::Tools::SmartPointer;
@@ -115,17 +111,10 @@ bool InterruptListener_Win64::IsTouched() const try { return watch_->IsTouched()
 TRACED
 
 void InterruptListener_Win64::Start() try {
-    if (thread_) {
-        return;
-    }
-    watch_->SetPipe(&*pipe_);
-    thread_ = watch_->Launch();
     if (!thread_) {
-        throw IOException("could not create interrupt listener thread", Here());
+        watch_->SetPipe(&*pipe_);
     }
-    if (!watch_->AwaitStart()) {
-        throw IOException("interrupt listener thread had timeout", Here());
-    }
+    watch_->Start(thread_);
 }
 TRACED
 
