@@ -18,7 +18,6 @@
 #include "Protocol/ByteOrder.h"
 #include "Protocol/Instrument.h"
 #include "Protocol/MaximumDevices.h"
-#include "Utilities/Exceptions/Location.h"
 #include "Utilities/Exceptions/Trace.h"
 #include "Utilities/Multithreading/Mutex.h"
 #include "Utilities/Multithreading/ScopedLock.h"
@@ -26,12 +25,7 @@
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 namespace NativeDriver = Protocol::NativeDriver;
-using Generic::Utilities::IOException;
-using Generic::Utilities::Shortfall;
-using Generic::Utilities::TimeoutException;
 using Platform::WaitResult;
-using Varnholt::Utilities::Exceptions::Here;
-using Varnholt::Utilities::Exceptions::SourceLocation;
 using Varnholt::Utilities::Multithreading::Mutex;
 using Varnholt::Utilities::Multithreading::ScopedLock;
 
@@ -216,122 +210,86 @@ TRACED
 void PellandoUSBDevice::ReadDataStrip(ScanRecordList& records, std::uint32_t recordSize,
                                       std::uint32_t timeout) try {
     RecordCollector collector(records, recordSize);
-    ReadStrip(collector, PartialData::Dropped, recordSize, timeout);
+    ReadStrip(collector, PartialData::Dropped, recordSize, timeout, std::nullopt);
 }
 TRACED
 
 void PellandoUSBDevice::ReadDataStrip(ScanReceiver& receiver, std::uint32_t recordSize,
                                       std::uint32_t timeout) try {
-    ReadStrip(receiver, PartialData::Received, recordSize, timeout);
+    ReadStrip(receiver, PartialData::Received, recordSize, timeout, std::nullopt);
 }
 TRACED
-
-void PellandoUSBDevice::ReadStrip(ScanReceiver& receiver, PartialData partialData, std::uint32_t recordSize,
-                                  std::uint32_t timeout) {
-    const ScopedLock held(core_->lock);
-    const std::uint32_t chunk = ChunkSize(recordSize);
-    const std::uint32_t limit = WaitLimit(timeout, ScanGrace);
-    StripReader reader(core_->read, chunk);
-    reader.Start(RecordsOfFirstRead * recordSize);
-    reader.Advance();
-    bool isFirst = true;
-    for (bool hasEnded = false;;) {
-        reader.Start(chunk);
-        receiver.Receive(reader.Arrived());
-        if (hasEnded) {
-            return;
-        }
-        const WaitResult waited = reader.Await(limit);
-        if (waited == WaitResult::Abandoned) {
-            throw TimeoutException("Read data failed (Abandoned)", Here());
-        }
-        if (std::exchange(isFirst, false)) {
-            Platform::Beep(Protocol::BeepFrequency, Protocol::BeepDuration);
-        }
-        if (!reader.HasSucceeded()) {
-            HandOverPartialData(reader, receiver, partialData);
-            throw IOException("Read data failed (OverlappedRead)", Here(), reader.FailureCode());
-        }
-        if (reader.Count() % recordSize != 0 || reader.Count() > reader.SizeAsked()) {
-            HandOverPartialData(reader, receiver, partialData);
-            throw IOException("Read data failed (wrong data size)", Here());
-        }
-        hasEnded = reader.Count() != reader.SizeAsked();
-        reader.Advance();
-    }
-}
 
 void PellandoUSBDevice::ReadDataCountedStrip(ScanRecordList& records, std::uint32_t recordSize,
                                              std::uint32_t timeout, std::uint32_t total) try {
     RecordCollector collector(records, recordSize);
-    ReadCountedStrip(collector, PartialData::Dropped, recordSize, timeout, total);
+    ReadStrip(collector, PartialData::Dropped, recordSize, timeout, total);
 }
 TRACED
 
 void PellandoUSBDevice::ReadDataCountedStrip(ScanReceiver& receiver, std::uint32_t recordSize,
                                              std::uint32_t timeout, std::uint32_t total) try {
-    ReadCountedStrip(receiver, PartialData::Received, recordSize, timeout, total);
+    ReadStrip(receiver, PartialData::Received, recordSize, timeout, total);
 }
 TRACED
 
-void PellandoUSBDevice::ReadCountedStrip(ScanReceiver& receiver, PartialData partialData,
-                                         std::uint32_t recordSize, std::uint32_t timeout,
-                                         std::uint32_t total) {
+/// A counted strip asks for its total and takes nothing else. Another begins with a small read, so that the
+/// first data come soon, and goes on until less comes than was asked for.
+void PellandoUSBDevice::ReadStrip(ScanReceiver& receiver, PartialData partialData, std::uint32_t recordSize,
+                                  std::uint32_t timeout, std::optional<std::uint32_t> total) {
     const ScopedLock held(core_->lock);
     const std::uint32_t chunk = ChunkSize(recordSize);
     const std::uint32_t limit = WaitLimit(timeout, ScanGrace);
-    std::uint32_t remaining = total;
-    const auto takeNext = [&] {
-        const std::uint32_t size = std::min(chunk, remaining);
-        remaining -= size;
+    const std::string failed = std::string(total ? "system busy. try again. " : "") + "Read data failed (";
+    StripReader reader(core_->read, chunk);
+    std::uint32_t remaining = total.value_or(0);
+    const auto start = [&](std::uint32_t wanted) {
+        const std::uint32_t size = total ? std::min(wanted, remaining) : wanted;
+        remaining -= total ? size : 0;
+        if (size > 0) {
+            reader.Start(size);
+        }
         return size;
     };
-    StripReader reader(core_->read, chunk);
-    std::uint32_t current = takeNext();
+    std::uint32_t current = start(total ? chunk : RecordsOfFirstRead * recordSize);
     if (current > 0) {
-        reader.Start(current);
         reader.Advance();
     }
-    for (;;) {
-        const std::uint32_t next = takeNext();
-        if (next > 0) {
-            reader.Start(next);
-        }
+    for (bool isFirst = true;; isFirst = false) {
+        const std::uint32_t next = start(chunk);
         receiver.Receive(reader.Arrived());
         if (current == 0) {
             return;
         }
         if (reader.Await(limit) == WaitResult::Abandoned) {
-            throw TimeoutException("system busy. try again. Read data failed (Abandoned - remaining: " +
-                                       std::to_string(remaining) + " total: " + std::to_string(total) + ")",
+            throw TimeoutException(failed + "Abandoned" +
+                                       (total ? " - remaining: " + std::to_string(remaining) +
+                                                    " total: " + std::to_string(*total)
+                                              : "") +
+                                       ")",
                                    Here());
         }
-        const auto state = [&] {
-            return " - read: " + std::to_string(reader.Count()) + ", expected: " + std::to_string(current) +
-                   ", remaining: " + std::to_string(remaining) + ")";
-        };
-        if (!reader.HasSucceeded()) {
-            const std::string text = state();
-            HandOverPartialData(reader, receiver, partialData);
-            throw IOException("system busy. try again. Read data failed (OverlappedRead" + text, Here(),
-                              reader.FailureCode());
+        if (isFirst && !total) {
+            Platform::Beep(Protocol::BeepFrequency, Protocol::BeepDuration);
         }
-        if (reader.Count() != current) {
-            const Shortfall shortfall{reader.Count(), current};
-            const std::string text = state();
-            HandOverPartialData(reader, receiver, partialData);
-            throw IOException("system busy. try again. Read data failed (wrong data size" + text, Here(),
-                              shortfall);
+        const std::uint32_t count = reader.Count();
+        const bool fits = total ? count == current : count % recordSize == 0 && count <= current;
+        if (!reader.HasSucceeded() || !fits) {
+            const std::string counts = total ? " - read: " + std::to_string(count) +
+                                                   ", expected: " + std::to_string(current) +
+                                                   ", remaining: " + std::to_string(remaining) + ")"
+                                             : ")";
+            if (partialData == PartialData::Received) {
+                receiver.Receive(reader.EndAndTake());
+            }
+            if (!reader.HasSucceeded()) {
+                throw IOException(failed + "OverlappedRead" + counts, Here(), reader.FailureCode());
+            }
+            const std::string text = failed + "wrong data size" + counts;
+            throw total ? IOException(text, Here(), Shortfall{count, current}) : IOException(text, Here());
         }
         reader.Advance();
-        current = next;
-    }
-}
-
-void PellandoUSBDevice::HandOverPartialData(StripReader& reader, ScanReceiver& receiver,
-                                            PartialData partialData) {
-    if (partialData == PartialData::Received) {
-        receiver.Receive(reader.EndAndTake());
+        current = total || count == current ? next : 0;
     }
 }
 

@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -12,8 +13,6 @@
 #include "Protocol/NativeDriver.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
-
-class StripReader;
 
 /// One opened instrument on its own kernel driver: its pipes, its interrupt listener, and the device lock
 /// that every transfer takes for its whole run. The lock is recursive and shared with everybody on the
@@ -84,11 +83,9 @@ class PellandoUSBDevice final : public Generic::EventListener {
     /// What becomes of the data of a transfer that failed.
     enum class PartialData { Dropped, Received };
 
+    /// Without a total, until the instrument ends it.
     void ReadStrip(ScanReceiver& receiver, PartialData partialData, std::uint32_t recordSize,
-                   std::uint32_t timeout);
-    void ReadCountedStrip(ScanReceiver& receiver, PartialData partialData, std::uint32_t recordSize,
-                          std::uint32_t timeout, std::uint32_t total);
-    static void HandOverPartialData(StripReader& reader, ScanReceiver& receiver, PartialData partialData);
+                   std::uint32_t timeout, std::optional<std::uint32_t> total);
 
     const std::shared_ptr<Core> core_;  ///< with the listener's thread, while that delivers a message
     InterruptListener interruptListener_;

@@ -1,6 +1,5 @@
 #pragma once
 
-#include <array>
 #include <cstdint>
 #include <memory>
 #include <span>
@@ -39,7 +38,6 @@ class StripReader final {
     /// Why not: `Errors::IoIncomplete` when it still ran.
     Platform::ErrorCode FailureCode() const { return failure_; }
     std::uint32_t Count() const { return count_; }
-    std::uint32_t SizeAsked() const { return waiting_->asked; }
 
     /// Makes the data of the read that was waited for the arrived data, and the read behind it the one to
     /// wait for.
