@@ -9,22 +9,10 @@
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 using namespace Generic::Configuration;
-using Generic::Utilities::DataException;
-using Varnholt::Utilities::Exceptions::Here;
 
 namespace {
 
-// Categories, as bits.
-constexpr unsigned Calibration = 1U << 0;
-constexpr unsigned Log = 1U << 1;
-constexpr unsigned Misc = 1U << 2;
-constexpr unsigned Special = 1U << 3;
-constexpr unsigned Measure = 1U << 4;
-constexpr unsigned Reset = 1U << 5;
-constexpr unsigned Cpld = 1U << 6;
-constexpr unsigned FirmwareDownload = 1U << 7;
-constexpr unsigned ModeDependent = 1U << 8;
-constexpr unsigned None = 0;
+using enum ConfigurationDataConverter::Category;
 
 struct Identifier {
     std::uint16_t id;
@@ -106,39 +94,11 @@ const Identifier* Find(std::uint16_t id) {
     return found != Identifiers.end() && found->id == id ? found : nullptr;
 }
 
-bool Belongs(std::uint16_t id, unsigned category) {
-    const Identifier* const known = Find(id);
-    return known && (known->categories & category) != 0;
-}
-
 }  // namespace
 
-bool ConfigurationDataConverter::IsCalibrationParameter(std::uint16_t id) {
-    return Belongs(id, Calibration);
-}
-bool ConfigurationDataConverter::IsLogParameter(std::uint16_t id) {
-    return Belongs(id, Log);
-}
-bool ConfigurationDataConverter::IsMiscParameter(std::uint16_t id) {
-    return Belongs(id, Misc);
-}
-bool ConfigurationDataConverter::IsSpecialParameter(std::uint16_t id) {
-    return Belongs(id, Special);
-}
-bool ConfigurationDataConverter::IsMeasureParameter(std::uint16_t id) {
-    return Belongs(id, Measure);
-}
-bool ConfigurationDataConverter::IsResetParameter(std::uint16_t id) {
-    return Belongs(id, Reset);
-}
-bool ConfigurationDataConverter::IsCPLDParameter(std::uint16_t id) {
-    return Belongs(id, Cpld);
-}
-bool ConfigurationDataConverter::IsFirmwareDownloadParameter(std::uint16_t id) {
-    return Belongs(id, FirmwareDownload);
-}
-bool ConfigurationDataConverter::IsModeDependent(std::uint16_t id) {
-    return Belongs(id, ModeDependent);
+bool ConfigurationDataConverter::Belongs(std::uint16_t id, Category category) {
+    const Identifier* const known = Find(id);
+    return known && (known->categories & category) != 0;
 }
 
 Property ConfigurationDataConverter::GetDefaultProperty(std::uint16_t id) try {

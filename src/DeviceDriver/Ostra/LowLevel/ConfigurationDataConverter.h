@@ -13,18 +13,33 @@ class ConfigurationDataConverter final {
   public:
     ConfigurationDataConverter() = delete;
 
+    /// As bits.
+    enum Category : unsigned {
+        None = 0,
+        Calibration = 1U << 0,
+        Log = 1U << 1,
+        Misc = 1U << 2,
+        Special = 1U << 3,
+        Measure = 1U << 4,
+        Reset = 1U << 5,
+        Cpld = 1U << 6,
+        FirmwareDownload = 1U << 7,
+        ModeDependent = 1U << 8,
+    };
+    static bool Belongs(std::uint16_t id, Category category);
+
     /// Plain predicates; an unknown identifier belongs nowhere. An identifier belongs to at most one of them,
     /// except that the special ones are calibration parameters, and the measure parameters (among others)
     /// depend on the measurement mode.
-    static bool IsCalibrationParameter(std::uint16_t id);
-    static bool IsLogParameter(std::uint16_t id);
-    static bool IsMiscParameter(std::uint16_t id);
-    static bool IsSpecialParameter(std::uint16_t id);
-    static bool IsMeasureParameter(std::uint16_t id);
-    static bool IsResetParameter(std::uint16_t id);
-    static bool IsCPLDParameter(std::uint16_t id);
-    static bool IsFirmwareDownloadParameter(std::uint16_t id);
-    static bool IsModeDependent(std::uint16_t id);
+    static bool IsCalibrationParameter(std::uint16_t id) { return Belongs(id, Calibration); }
+    static bool IsLogParameter(std::uint16_t id) { return Belongs(id, Log); }
+    static bool IsMiscParameter(std::uint16_t id) { return Belongs(id, Misc); }
+    static bool IsSpecialParameter(std::uint16_t id) { return Belongs(id, Special); }
+    static bool IsMeasureParameter(std::uint16_t id) { return Belongs(id, Measure); }
+    static bool IsResetParameter(std::uint16_t id) { return Belongs(id, Reset); }
+    static bool IsCPLDParameter(std::uint16_t id) { return Belongs(id, Cpld); }
+    static bool IsFirmwareDownloadParameter(std::uint16_t id) { return Belongs(id, FirmwareDownload); }
+    static bool IsModeDependent(std::uint16_t id) { return Belongs(id, ModeDependent); }
 
     /// Zeros of the identifier's type and element count. An identifier without a default is refused with
     /// `DataException` "invalid property id N".
