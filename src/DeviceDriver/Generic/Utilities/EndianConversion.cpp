@@ -10,11 +10,7 @@ namespace Varnholt::DeviceDriver::Generic::Utilities::EndianConversion {
 static_assert(sizeof(float) == sizeof(std::uint32_t));
 
 void ShortToByteArray(std::uint16_t value, std::uint8_t* bytes, bool bigEndian) {
-    if (bigEndian) {
-        Protocol::StoreBig16(bytes, value);
-    } else {
-        Protocol::StoreLittle16(bytes, value);
-    }
+    bigEndian ? Protocol::StoreBig16(bytes, value) : Protocol::StoreLittle16(bytes, value);
 }
 
 void ShortToByteArray(std::int16_t value, std::uint8_t* bytes, bool bigEndian) {
@@ -22,11 +18,7 @@ void ShortToByteArray(std::int16_t value, std::uint8_t* bytes, bool bigEndian) {
 }
 
 void LongToByteArray(std::uint32_t value, std::uint8_t* bytes, bool bigEndian) {
-    if (bigEndian) {
-        Protocol::StoreBig32(bytes, value);
-    } else {
-        Protocol::StoreLittle32(bytes, value);
-    }
+    bigEndian ? Protocol::StoreBig32(bytes, value) : Protocol::StoreLittle32(bytes, value);
 }
 
 void LongToByteArray(std::int32_t value, std::uint8_t* bytes, bool bigEndian) {

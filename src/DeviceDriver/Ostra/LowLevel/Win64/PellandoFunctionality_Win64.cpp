@@ -14,20 +14,16 @@
 #include "Platform/ScopedThreadPriority.h"
 #include "Platform/Time.h"
 #include "Protocol/MaximumDevices.h"
-#include "Utilities/Exceptions/Location.h"
 #include "Utilities/Exceptions/Trace.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 namespace DataStage = Protocol::DataStage;
 using namespace Protocol::UsbIoDriver;
-using Generic::Utilities::DataException;
-using Generic::Utilities::IOException;
 using Protocol::Request;
 using UsbIo::CUsbIo;
 using UsbIo::CUsbIoBuffer;
 using UsbIo::CUsbIoPipe;
-using Varnholt::Utilities::Exceptions::Here;
 using Varnholt::Utilities::Tools::SmartPointer;
 
 namespace {
@@ -307,7 +303,7 @@ void PellandoFunctionality_Win64::StartScan(std::uint32_t, std::uint32_t timeout
                                             std::uint32_t total) try {
     PrepareScan(total);
     receiverLimit_ = WaitLimit(timeoutSeconds * MillisecondsPerSecond + ScanGrace);
-    if (!fixedSize_) {
+    if (!IsFixedSize()) {
         StartBeep();
     }
     const Platform::ScopedThreadPriority priority(Platform::HighestThreadPriority);
@@ -325,13 +321,12 @@ void PellandoFunctionality_Win64::GetScanData(std::uint8_t* buffer, std::uint32_
 TRACED
 
 void PellandoFunctionality_Win64::PrepareScan(std::uint32_t total) {
-    fixedSize_ = total != 0;
     scanTotal_ = total;
     received_ = 0;
     readPosition_ = 0;
     scanEnd_ = 0;
     if (Receiver() == nullptr) {
-        scanData_.Reset(fixedSize_ ? scanTotal_ : OpenEndedScanStartSize);
+        scanData_.Reset(IsFixedSize() ? scanTotal_ : OpenEndedScanStartSize);
     } else {
         scanData_.Reset(0);
     }
@@ -346,7 +341,8 @@ void PellandoFunctionality_Win64::ReadMeasureData() try {
     }
     CUsbIoBuffer* current = &a;
     CUsbIoBuffer* next = &b;
-    current->NumberOfBytesToTransfer = fixedSize_ ? std::min(scanTotal_, ScanTransferSize) : ScanTransferSize;
+    current->NumberOfBytesToTransfer =
+        IsFixedSize() ? std::min(scanTotal_, ScanTransferSize) : ScanTransferSize;
     readPipe_->Read(*current);
     while (ReadMeasureDataInternal(*current, *next)) {
         std::swap(current, next);
@@ -360,7 +356,7 @@ TRACED
 bool PellandoFunctionality_Win64::ReadMeasureDataInternal(CUsbIoBuffer& current, CUsbIoBuffer& next) try {
     next.NumberOfBytesToTransfer = ScanTransferSize;
     const std::uint64_t asked = received_ + current.NumberOfBytesToTransfer;
-    if (fixedSize_ && asked <= scanTotal_) {
+    if (IsFixedSize() && asked <= scanTotal_) {
         next.NumberOfBytesToTransfer =
             static_cast<std::uint32_t>(std::min<std::uint64_t>(scanTotal_ - asked, ScanTransferSize));
     }
@@ -392,7 +388,7 @@ void PellandoFunctionality_Win64::TakeScanData(const CUsbIoBuffer& buffer) {
         CopyDataToBufferInternal(buffer);
         return;
     }
-    if (fixedSize_ && buffer.BytesTransferred > scanTotal_ - received_) {
+    if (IsFixedSize() && buffer.BytesTransferred > scanTotal_ - received_) {
         throw DataException("more bytes read than expected", Here());
     }
     received_ += buffer.BytesTransferred;
@@ -406,13 +402,13 @@ void PellandoFunctionality_Win64::CopyDataToBufferInternal(const CUsbIoBuffer& b
     }
     const std::uint64_t end = received_ + count;
     if (scanData_.Capacity() < end) {
-        if (fixedSize_) {
+        if (IsFixedSize()) {
             throw DataException("buffer size is fix", Here());
         }
         scanData_.Reserve(std::max(std::uint64_t{scanData_.Size()} * 2, end));
     }
     if (scanData_.Size() < end) {
-        if (fixedSize_ || end > MaximumScanSize) {
+        if (IsFixedSize() || end > MaximumScanSize) {
             throw DataException("more bytes read than expected", Here());
         }
         scanData_.Resize(static_cast<std::size_t>(end));

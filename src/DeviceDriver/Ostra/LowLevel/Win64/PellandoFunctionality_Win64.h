@@ -73,6 +73,7 @@ class PellandoFunctionality_Win64 final : public PellandoFunctionalityByte {
     void WriteData(const std::uint8_t* buffer, std::uint32_t length);
 
     void PrepareScan(std::uint32_t total);
+    bool IsFixedSize() const { return scanTotal_ != 0; }
     void ReadMeasureData();
     /// True while the scan goes on.
     bool ReadMeasureDataInternal(UsbIo::CUsbIoBuffer& current, UsbIo::CUsbIoBuffer& next);
@@ -93,8 +94,7 @@ class PellandoFunctionality_Win64 final : public PellandoFunctionalityByte {
     std::uint64_t received_ = 0;       ///< bytes that the running scan has brought
     std::uint32_t readPosition_ = 0;   ///< next byte that `GetScanData` hands out
     std::uint32_t scanEnd_ = 0;        ///< bytes that it can hand out
-    bool fixedSize_ = true;            ///< the running scan was asked for a number of bytes
-    std::uint32_t scanTotal_ = 0;      ///< that number
+    std::uint32_t scanTotal_ = 0;      ///< bytes that the running scan was asked for; 0: any number
     std::uint32_t receiverLimit_ = 0;  ///< milliseconds for a transfer of a scan that has a receiver
 };
 
