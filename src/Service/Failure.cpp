@@ -3,7 +3,6 @@
 #include <fmt/format.h>
 
 #include <array>
-#include <ios>
 #include <new>
 #include <string_view>
 #include <utility>
@@ -93,37 +92,18 @@ Failure OfLibrary(FailureKind kind, const Utilities::Exceptions::TraceableExcept
 
 }  // namespace
 
-Failure::Failure(FailureKind failureKind, const std::string& message, std::string wayOut)
-    : Failure(failureKind, message, std::move(wayOut), {}) {}
-
-Failure::Failure(FailureKind failureKind, const std::string& message, std::string wayOut,
-                 std::string driverText)
-    : std::runtime_error(message),
-      kind_(failureKind),
-      message_(message),
+Failure::Failure(FailureKind failureKind, std::string message, std::string wayOut, std::string libraryText)
+    : kind_(failureKind),
+      text_(message),
+      message_(std::move(message)),
       advice_(std::move(wayOut)),
-      driverText_(std::move(driverText)) {}
+      driverText_(std::move(libraryText)) {}
 
-Failure::Failure(const Failure& other, const std::string& identifier, const std::string& message)
-    : std::runtime_error(identifier.empty() ? message : identifier + ": " + message),
-      kind_(other.kind_),
-      message_(message),
-      advice_(other.advice_),
-      instrument_(identifier),
-      driverText_(other.driverText_) {}
-
-Failure Failure::Saying(const std::string& message) const {
-    return {*this, instrument_, message};
-}
-
-Failure Failure::Advising(const std::string& wayOut) const {
+Failure Failure::With(std::string Failure::*part, const std::string& value) const {
     Failure failure = *this;
-    failure.advice_ = wayOut;
+    failure.*part = value;
+    failure.text_ = (failure.instrument_.empty() ? "" : failure.instrument_ + ": ") + failure.message_;
     return failure;
-}
-
-Failure Failure::Of(const std::string& identifier) const {
-    return {*this, identifier, message_};
 }
 
 bool Failure::IsOfTransfer() const {

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <exception>
-#include <stdexcept>
 #include <string>
 
 namespace Varnholt::Service {
@@ -25,15 +24,15 @@ enum class FailureKind {
 
 /// Why something could not be done. Everything in this namespace that fails throws it; what else the library
 /// throws becomes one with `Describe`.
-class Failure final : public std::runtime_error {
+class Failure final : public std::exception {
   public:
-    /// `message` names the thing; `wayOut` is what the user can do, empty where nothing is known.
-    Failure(FailureKind failureKind, const std::string& message, std::string wayOut = {});
-    /// Of the library, whose own text is `driverText`.
-    Failure(FailureKind failureKind, const std::string& message, std::string wayOut, std::string driverText);
+    /// `message` names the thing; `wayOut` is what the user can do, empty where nothing is known;
+    /// `libraryText` is the library's own, where it is a failure of that.
+    Failure(FailureKind failureKind, std::string message, std::string wayOut = {},
+            std::string libraryText = {});
 
     /// The whole text: the instrument's identifier, where the failure is one's, and the message.
-    using std::runtime_error::what;
+    const char* what() const noexcept override { return text_.c_str(); }
 
     FailureKind Kind() const { return kind_; }
     const std::string& Message() const { return message_; }
@@ -44,17 +43,18 @@ class Failure final : public std::runtime_error {
     const std::string& DriverText() const { return driverText_; }
 
     /// The same failure with this message, this advice, of this instrument.
-    Failure Saying(const std::string& message) const;
-    Failure Advising(const std::string& wayOut) const;
-    Failure Of(const std::string& identifier) const;
+    Failure Saying(const std::string& message) const { return With(&Failure::message_, message); }
+    Failure Advising(const std::string& wayOut) const { return With(&Failure::advice_, wayOut); }
+    Failure Of(const std::string& identifier) const { return With(&Failure::instrument_, identifier); }
 
     /// Whether the transfer itself failed, with no better reason known.
     bool IsOfTransfer() const;
 
   private:
-    Failure(const Failure& other, const std::string& identifier, const std::string& message);
+    Failure With(std::string Failure::*part, const std::string& value) const;
 
     FailureKind kind_;
+    std::string text_;
     std::string message_;
     std::string advice_;
     std::string instrument_;
