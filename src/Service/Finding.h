@@ -34,5 +34,8 @@ Finding JudgeAnswer(const std::string& subject, const Answer& answer);
 /// Looks at everything that could be an instrument, with the means of this platform, and opens (and thereby
 /// resets) those that are free.
 std::vector<Finding> Diagnose(Context& context);
+/// The same where kernel drivers stand between the library and the instruments: looks at the interfaces of
+/// both drivers. Takes up to 8 seconds for an instrument whose lock another process keeps.
+std::vector<Finding> DiagnoseDrivers(Context& context);
 
 }  // namespace Varnholt::Service

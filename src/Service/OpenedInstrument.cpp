@@ -5,7 +5,7 @@
 #include <mutex>
 #include <set>
 
-#include "Service/Holder.h"
+#include "Service/SystemAdvice.h"
 
 namespace Varnholt::Service {
 namespace {

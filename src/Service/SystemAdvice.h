@@ -1,9 +1,11 @@
 #pragma once
 
+#include <string>
+
 #include "Platform/ErrorCodes.h"
 #include "Service/Failure.h"
 
-/// What the user can do next with this system's means.
+/// What the user can do next, and be told, with this system's means.
 namespace Varnholt::Service {
 
 namespace SystemAdvice {
@@ -14,5 +16,8 @@ extern const char* const TransferFailed;
 
 /// Why the system refuses the lock of an instrument, and what to do: `code` is what `MakeMutex` left.
 Failure DescribeMissingLock(Platform::ErrorCode code);
+
+/// Which other process uses the instrument, as "NAME (process NUMBER)"; empty where that cannot be seen.
+std::string HolderOf(const std::string& identifier);
 
 }  // namespace Varnholt::Service

@@ -3,7 +3,7 @@
 #include "Platform/HostQueries.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/UsbIoDriver.h"
-#include "Service/Win32/Diagnosis.h"
+#include "Service/Finding.h"
 #include "Support/ScriptedDriver.h"
 #include "Support/TestClock.h"
 

@@ -1,5 +1,3 @@
-#include "Service/Win32/Diagnosis.h"
-
 #include <fmt/format.h>
 
 #include <algorithm>
@@ -12,6 +10,7 @@
 #include "Platform/WaitableObjects.h"
 #include "Protocol/NativeDriver.h"
 #include "Protocol/UsbIoDriver.h"
+#include "Service/Finding.h"
 #include "Service/Instruments.h"
 #include "Service/SystemAdvice.h"
 #include "UsbIo/UsbIoRecords.h"

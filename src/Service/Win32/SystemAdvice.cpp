@@ -2,6 +2,8 @@
 
 #include <fmt/format.h>
 
+#include "Service/Finding.h"
+
 namespace Varnholt::Service {
 
 namespace SystemAdvice {
@@ -16,6 +18,15 @@ Failure DescribeMissingLock(Platform::ErrorCode code) {
                         Platform::ErrorText(code)),
             code == Platform::Errors::AccessDenied ? "another user's program has it: end that program"
                                                    : "try again; if it stays, restart Windows"};
+}
+
+std::vector<Finding> Diagnose(Context& context) {
+    return DiagnoseDrivers(context);
+}
+
+/// The system does not say.
+std::string HolderOf(const std::string&) {
+    return {};
 }
 
 }  // namespace Varnholt::Service
