@@ -27,12 +27,11 @@ void Session::CarryOut() {
     if (!captureFile.empty()) {
         recording_ = RecordTraffic(captureFile);
     }
+    Service::InterruptibleDeviceFiles::Log log;
     if (verbose) {
-        loggedFiles_.emplace(Platform::DeviceFiles(),
-                             [this](const std::string& line) { streams_.log << Name + line + '\n'; });
-        loggedFilesInForce_.emplace(*loggedFiles_);
+        log = [this](const std::string& line) { streams_.log << Name + line + '\n'; };
     }
-    context_.emplace(*this, interruption_);
+    context_.emplace(*this, interruption_, std::move(log));
     interruption_.ThrowIfRequested();  // one that came before
     action();
     FlushOut();
@@ -53,6 +52,10 @@ std::string Session::Paint(const char* color, const std::string& text) const {
 
 void Session::Print(const Json& value) {
     Out() << value.Text();
+}
+
+void Session::Print(bool asJson, const Json& value, const std::string& text) {
+    Out() << (asJson ? value.Text() : text);
 }
 
 void Session::FlushOut() {

@@ -8,7 +8,6 @@
 #include <string>
 
 #include "ExitCode.h"
-#include "LoggedDeviceFiles.h"
 #include "Output/Plot.h"
 #include "Service/Context.h"
 #include "Terminal.h"
@@ -43,6 +42,8 @@ class Session final : public Service::Observer {
     std::ostream& Out() { return outIsClaimed_ ? streams_.err : streams_.out; }
     const StreamFacts& OutFacts() const { return streams_.outFacts; }
     void Print(const Json& value);
+    /// A result that has both forms.
+    void Print(bool asJson, const Json& value, const std::string& text);
     /// What is in `Out` is on its way; throws where it cannot be written.
     void FlushOut();
 
@@ -87,9 +88,7 @@ class Session final : public Service::Observer {
     Streams& streams_;
     Service::Interruption& interruption_;
     std::unique_ptr<TrafficRecording> recording_;
-    std::optional<LoggedDeviceFiles> loggedFiles_;  // stand on those of the recording
-    std::optional<Platform::ScopedDeviceFiles> loggedFilesInForce_;
-    std::optional<Service::Context> context_;  // stands on those before
+    std::optional<Service::Context> context_;  // stands on the recording's files
     bool outIsClaimed_ = false;
     bool inIsClaimed_ = false;
 };

@@ -21,10 +21,10 @@ bool IsOwn(const std::exception_ptr& exception) {
 
 }  // namespace
 
-Context::Context(Observer& toldObserver, Interruption& userInterruption)
+Context::Context(Observer& toldObserver, Interruption& userInterruption, InterruptibleDeviceFiles::Log log)
     : observer_(toldObserver),
       interruption_(userInterruption),
-      ownFiles_(std::make_unique<OwnFiles>()),
+      ownFiles_(std::make_unique<OwnFiles>(std::move(log))),
       files_(ownFiles_->files) {
     interruption_.SetAction([this] { files_.Interrupt(device_); });
 }

@@ -19,8 +19,8 @@ class Context final {
     using Transport = DeviceDriver::Ostra::Transport;
 
     /// Both must outlive the object. For its life the device files that were in force can be interrupted, and
-    /// an interruption does that.
-    Context(Observer& toldObserver, Interruption& userInterruption);
+    /// an interruption does that; `log`, where there is one, is told of their transfers.
+    Context(Observer& toldObserver, Interruption& userInterruption, InterruptibleDeviceFiles::Log log = {});
     /// The same for one instrument of several that are used at the same time: `sharedFiles` are in force
     /// already, outlive the object too, and an interruption ends what runs on the device with this
     /// identifier.
@@ -49,7 +49,10 @@ class Context final {
 
   private:
     struct OwnFiles {
-        InterruptibleDeviceFiles files{Platform::DeviceFiles()};
+        explicit OwnFiles(InterruptibleDeviceFiles::Log log)
+            : files(Platform::DeviceFiles(), std::move(log)) {}
+
+        InterruptibleDeviceFiles files;
         const Platform::ScopedDeviceFiles inForce{files};
     };
 

@@ -1,9 +1,15 @@
 #include "Service/InterruptibleDeviceFiles.h"
 
+#include <fmt/format.h>
+
 #include <algorithm>
 #include <mutex>
 #include <new>
+#include <optional>
+#include <span>
+#include <utility>
 
+#include "Capture/DescribeRequest.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/Instrument.h"
 #include "Protocol/NativeDriver.h"
@@ -16,17 +22,59 @@ using namespace Platform;
 namespace Native = Protocol::NativeDriver;
 
 namespace {
+
 constexpr std::uint32_t AbortLimit = 2000;  // milliseconds
+
+/// The vendor request that a driver's control asks for.
+struct VendorRequest {
+    std::uint8_t request;
+    std::uint16_t value;
+    bool isIn;
+};
+
+std::optional<VendorRequest> VendorRequestOf(std::uint32_t code, std::span<const std::uint8_t> block) {
+    namespace UsbIo = Protocol::UsbIoDriver;
+    switch (code) {
+        case Native::ControlVendorRequest:
+        case Native::ControlButtonReport:
+            if (block.size() < Native::ControlBlockSize) {
+                break;
+            }
+            return VendorRequest{block[Native::Block::Request],
+                                 Protocol::LoadLittle16(&block[Native::Block::Value]),
+                                 block[Native::Block::Direction] == Native::DirectionIn};
+        case UsbIo::Control::ClassOrVendorInRequest:
+        case UsbIo::Control::ClassOrVendorOutRequest:
+            if (block.size() < UsbIo::RequestBlock::Size) {
+                break;
+            }
+            return VendorRequest{block[UsbIo::RequestBlock::Request],
+                                 Protocol::LoadLittle16(&block[UsbIo::RequestBlock::Value]),
+                                 code == UsbIo::Control::ClassOrVendorInRequest};
+        default:
+            break;
+    }
+    return std::nullopt;
 }
 
-InterruptibleDeviceFiles::InterruptibleDeviceFiles(DeviceFileSystem& underlying) : below_(underlying) {}
+std::string TextOfFailure(ErrorCode code) {
+    const bool isWanted =
+        code == Errors::OperationAborted || code == Protocol::UsbIoDriver::Status::Cancelled;
+    return isWanted ? ": cancelled" : fmt::format(": failed with code 0x{:X}", code);
+}
+
+}  // namespace
+
+InterruptibleDeviceFiles::InterruptibleDeviceFiles(DeviceFileSystem& underlying, Log tell)
+    : below_(underlying), log_(std::move(tell)) {}
 
 void InterruptibleDeviceFiles::Interrupt(const std::string& device) {
     const std::lock_guard holder(section_);
     interrupted_.push_back(device);
     for (const OpenedFile& file : files_) {
-        const bool isBusy = std::ranges::any_of(
-            running_, [&file](const auto& transfer) { return transfer.second == file.handle; });
+        const bool isBusy = std::ranges::any_of(running_, [&file](const auto& transfer) {
+            return transfer.second.isOnPipe && transfer.second.file == file.handle;
+        });
         if (isBusy && IsInterrupted(file.handle)) {
             AbortPipe(file);
         }
@@ -118,7 +166,7 @@ bool InterruptibleDeviceFiles::CloseFile(Handle file) {
     {
         const std::lock_guard holder(section_);
         std::erase_if(files_, [file](const OpenedFile& opened) { return opened.handle == file; });
-        std::erase_if(running_, [file](const auto& transfer) { return transfer.second == file; });
+        std::erase_if(running_, [file](const auto& transfer) { return transfer.second.file == file; });
     }
     return below_.CloseFile(file);
 }
@@ -133,38 +181,73 @@ bool InterruptibleDeviceFiles::Refuse(Overlapped& record, ErrorCode code) {
     return false;
 }
 
+/// The caller finds the last error as it was.
+void InterruptibleDeviceFiles::Ended(const Overlapped& record, std::uint32_t transferred, bool succeeded) {
+    const ErrorCode code = LastError();
+    Description describe;
+    {
+        const std::lock_guard holder(section_);
+        if (const auto found = running_.find(&record); found != running_.end()) {
+            describe = std::move(found->second.describe);
+            running_.erase(found);
+        }
+    }
+    if (describe) {  // without the section, for which an interruption would have to wait
+        const std::lock_guard holder(telling_);
+        log_(describe(transferred) + (succeeded ? "" : TextOfFailure(code)));
+    }
+    SetLastError(code);
+}
+
+/// Of a transfer that is noted already: its end may be learnt of on another thread.
+template <class Start>
+bool InterruptibleDeviceFiles::Started(const Overlapped& record, Start start) {
+    const bool completed = start();
+    if (!completed && LastError() != Errors::IoPending) {
+        Ended(record, 0, false);
+    }
+    return completed;
+}
+
 /// The section is held over the start, so that no transfer slips in behind an interruption.
 template <class Start>
-bool InterruptibleDeviceFiles::StartTransfer(Handle file, Overlapped& record, Start start) try {
+bool InterruptibleDeviceFiles::StartTransfer(Handle file, std::uint8_t endpoint, std::uint32_t length,
+                                             Overlapped& record, Start start) try {
     const std::lock_guard holder(section_);
     if (IsInterrupted(file)) {
         return Refuse(record, Errors::OperationAborted);
     }
-    running_[&record] = file;
-    const bool completed = start();
-    if (!completed && LastError() != Errors::IoPending) {
-        const ErrorCode code = LastError();
-        running_.erase(&record);
-        SetLastError(code);
+    Description describe;
+    if (log_) {
+        const OpenedFile* const opened = Find(file);
+        const bool isButton = opened != nullptr && opened->waitsForButton;
+        describe = [used = isButton ? Protocol::InterruptInEndpoint : endpoint,
+                    length](std::uint32_t transferred) {
+            return Capture::DescribeData(used, transferred, length);
+        };
     }
-    return completed;
+    running_[&record] = {file, true, std::move(describe)};
+    return Started(record, start);
 } catch (const std::bad_alloc&) {
     return Refuse(record, Errors::NotEnoughMemory);
 }
 
 bool InterruptibleDeviceFiles::StartRead(Handle file, void* buffer, std::uint32_t length,
                                          Overlapped& record) {
-    return StartTransfer(file, record, [&] { return below_.StartRead(file, buffer, length, record); });
+    return StartTransfer(file, Protocol::BulkInEndpoint, length, record,
+                         [&] { return below_.StartRead(file, buffer, length, record); });
 }
 
 bool InterruptibleDeviceFiles::StartWrite(Handle file, const void* buffer, std::uint32_t length,
                                           Overlapped& record) {
-    return StartTransfer(file, record, [&] { return below_.StartWrite(file, buffer, length, record); });
+    return StartTransfer(file, Protocol::BulkOutEndpoint, length, record,
+                         [&] { return below_.StartWrite(file, buffer, length, record); });
 }
 
 bool InterruptibleDeviceFiles::StartControl(Handle file, std::uint32_t code, const void* input,
                                             std::uint32_t inputSize, void* output, std::uint32_t outputSize,
                                             Overlapped& record) {
+    const std::span block(static_cast<const std::uint8_t*>(input), inputSize);
     {
         const std::lock_guard holder(section_);
         // A control is short and has no pipe that could be aborted; it ends by itself.
@@ -172,26 +255,30 @@ bool InterruptibleDeviceFiles::StartControl(Handle file, std::uint32_t code, con
             return Refuse(record, Errors::OperationAborted);
         }
         OpenedFile* const opened = Find(file);
-        if (opened != nullptr && code == Protocol::UsbIoDriver::Control::BindPipe && inputSize > 0) {
-            opened->waitsForButton =
-                *static_cast<const std::uint8_t*>(input) == Protocol::InterruptInEndpoint;
+        if (opened != nullptr && code == Protocol::UsbIoDriver::Control::BindPipe && !block.empty()) {
+            opened->waitsForButton = block.front() == Protocol::InterruptInEndpoint;
+        }
+        if (const auto request = VendorRequestOf(code, block); request && log_) {
+            running_[&record] = {
+                file, false,
+                [request = *request, data = static_cast<const std::uint8_t*>(output),
+                 outputSize](std::uint32_t transferred) {
+                    const std::uint32_t known = request.isIn ? std::min(transferred, outputSize) : outputSize;
+                    return Capture::DescribeRequest(request.request, request.value, {data, known});
+                }};
         }
     }
-    return below_.StartControl(file, code, input, inputSize, output, outputSize, record);
+    return Started(record, [&] {
+        return below_.StartControl(file, code, input, inputSize, output, outputSize, record);
+    });
 }
 
 bool InterruptibleDeviceFiles::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred,
                                          bool wait) {
     const bool succeeded = below_.GetResult(file, record, transferred, wait);
-    const ErrorCode code = LastError();
-    if (!succeeded && code == Errors::IoIncomplete) {
-        return false;
+    if (succeeded || LastError() != Errors::IoIncomplete) {
+        Ended(record, transferred, succeeded);
     }
-    {
-        const std::lock_guard holder(section_);
-        running_.erase(&record);
-    }
-    SetLastError(code);
     return succeeded;
 }
 

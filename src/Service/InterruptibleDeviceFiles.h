@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <map>
 #include <string>
 #include <vector>
@@ -12,7 +13,8 @@ namespace Varnholt::Service {
 
 /// Device files that another thread can interrupt: what lets a program end a scan, which otherwise returns
 /// only when the instrument says so. Put in force with `Platform::ScopedDeviceFiles`; everything passes
-/// through to `below`.
+/// through to `below`. They can also tell of each command and transfer that ends, whichever driver it goes
+/// through; what a driver is asked for itself is left out.
 ///
 /// An interruption asks the driver to abort the pipes on which transfers run, in the driver's own way: the
 /// USBIO driver through the pipe's file, the instrument's own driver through the device's. What waits for the
@@ -22,8 +24,11 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
     using Handle = Platform::Handle;
     using Overlapped = Platform::Overlapped;
 
+    /// Called for one line at a time, on the thread that learns of the end.
+    using Log = std::function<void(const std::string& line)>;
+
     /// `underlying` must outlive the object.
-    explicit InterruptibleDeviceFiles(Platform::DeviceFileSystem& underlying);
+    explicit InterruptibleDeviceFiles(Platform::DeviceFileSystem& underlying, Log tell = {});
     InterruptibleDeviceFiles(const InterruptibleDeviceFiles&) = delete;
     InterruptibleDeviceFiles& operator=(const InterruptibleDeviceFiles&) = delete;
 
@@ -55,9 +60,20 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
         std::uint32_t pipe;   ///< of the instrument's own driver
         bool waitsForButton;  ///< the interrupt pipe's
     };
+    /// What a transfer was, once it is known how many bytes it has moved.
+    using Description = std::function<std::string(std::uint32_t transferred)>;
+    struct RunningTransfer {
+        Handle file;
+        bool isOnPipe;         ///< and not a control
+        Description describe;  ///< empty: its end is told nobody
+    };
 
     template <class Start>
-    bool StartTransfer(Handle file, Overlapped& record, Start start);
+    bool StartTransfer(Handle file, std::uint8_t endpoint, std::uint32_t length, Overlapped& record,
+                       Start start);
+    template <class Start>
+    bool Started(const Overlapped& record, Start start);
+    void Ended(const Overlapped& record, std::uint32_t transferred, bool succeeded);
     static bool Refuse(Overlapped& record, Platform::ErrorCode code);
     void AbortPipe(const OpenedFile& file);
     void Control(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize);
@@ -69,7 +85,10 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
     Platform::RecursiveMutex section_;
     std::vector<std::string> interrupted_;  ///< devices; an empty one: all
     std::vector<OpenedFile> files_;
-    std::map<const Overlapped*, Handle> running_;  ///< whose reads and writes run, and on which file
+    std::map<const Overlapped*, RunningTransfer> running_;
+
+    Platform::RecursiveMutex telling_;  ///< guards the log
+    const Log log_;
 };
 
 }  // namespace Varnholt::Service
