@@ -7,11 +7,12 @@
 #include <vector>
 
 #include "Interface/Readout.h"
+#include "Output/RecordCsv.h"
 #include "Output/RecordingFile.h"
-#include "Output/RecordWriter.h"
 #include "Protocol/ByteOrder.h"
 #include "SensorModel.h"
 #include "Service/Interruption.h"
+#include "Service/ScanRecorder.h"
 
 namespace Varnholt::Bench {
 namespace {
@@ -52,10 +53,14 @@ void ScanCsv(benchmark::State& state) {
     std::ofstream stream("/dev/null", std::ios::binary);
     Service::Interruption none;
     Cli::RecordingFile file("/dev/null", none);
-    Cli::RecordWriter writer({RecordSize, false, false, {}}, file);
+    Cli::RecordCsv csv(RecordSize, {});
+    const Service::RecordSink write = [&](std::span<const std::uint8_t> records, std::uint64_t milliseconds) {
+        file.Append(csv.Lines(records, file.Records() + 1, milliseconds), records.size() / RecordSize,
+                    Cli::RecordOutput::Form::Lines);
+    };
     Service::ScanReport report;
     Service::Progress unwatched;
-    Service::ScanRecorder recorder(RecordSize, writer, report, unwatched);
+    Service::ScanRecorder recorder(RecordSize, write, report, unwatched);
     double streamed = 0;
     double recorded = 0;
     for (auto _ : state) {

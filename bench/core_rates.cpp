@@ -4,6 +4,7 @@
 #include <chrono>
 #include <cstdlib>
 #include <ctime>
+#include <functional>
 #include <iostream>
 #include <numeric>
 #include <string>
@@ -25,9 +26,8 @@ double SecondsSince(Clock::time_point start) {
 }
 
 /// Makes values of the records and adds them up, as the package and the other side of the comparison do.
-class Summing final : public Service::RecordSink {
-  public:
-    void TakeRecords(std::span<const std::uint8_t> records, std::uint64_t) override {
+struct Summing {
+    void operator()(std::span<const std::uint8_t> records, std::uint64_t) {
         values.resize(records.size() / 2);
         for (std::size_t i = 0; i < values.size(); ++i) {
             values[i] = Interface::ReadingOf(Protocol::LoadBig16(&records[2 * i]));
@@ -73,7 +73,7 @@ int main(int count, char** arguments) {
     Service::ScanReport report;
     const auto total = static_cast<std::uint32_t>(settings.scanBytes);
     start = Clock::now();
-    RunScan(instrument, {Protocol::ReadoutBytes, total, 5}, sink, report);
+    RunScan(instrument, {Protocol::ReadoutBytes, total, 5}, std::ref(sink), report);
     std::cout << ' ' << static_cast<double>(total) / SecondsSince(start) << '\n';
     return last == 0 && sink.sum == 0 ? 1 : 0;
 }

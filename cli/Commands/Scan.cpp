@@ -8,7 +8,7 @@
 #include "Commands/MeasurementOutput.h"
 #include "Output/Json.h"
 #include "Output/ProgressLine.h"
-#include "Output/RecordWriter.h"
+#include "Output/RecordCsv.h"
 #include "Service/ScanRun.h"
 
 namespace Varnholt::Cli {
@@ -82,22 +82,37 @@ void PrintSummary(Session& session, const ScanOptions& options, const std::strin
                    {"ended", ending.how}});
 }
 
+std::span<const char> CharactersOf(std::span<const std::uint8_t> bytes) {
+    return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
+}
+
 /// Scans into the output and completes it. `ending` is kept up to date, for whoever catches a failure.
 void ScanInto(RecordOutput& output, Session& session, Service::OpenedInstrument& instrument,
               const ScanOptions& options, std::uint32_t total, Ending& ending) {
     PrepareMeasurement(instrument, options.measurement.Settings());
     Service::ElapsedTime time;
-    RecordWriter writer({options.recordSize, options.raw, options.header, {options.number, options.time}},
-                        output);
+    RecordCsv csv(options.recordSize, {options.number, options.time});
+    if (options.header) {
+        output.Append(csv.Head(), 0);
+    }
+    const auto write = [&](std::span<const std::uint8_t> records, std::uint64_t milliseconds) {
+        const std::uint64_t count = records.size() / options.recordSize;
+        if (options.raw) {
+            output.Append(CharactersOf(records), count);
+        } else {
+            output.Append(csv.Lines(records, output.Records() + 1, milliseconds), count,
+                          RecordOutput::Form::Lines);
+        }
+    };
     try {
-        RunScan(instrument, {options.recordSize, total, options.timeout}, writer, ending.report);
+        RunScan(instrument, {options.recordSize, total, options.timeout}, write, ending.report);
     } catch (...) {
         ending.seconds = time.Seconds();
         throw;
     }
     if (const auto& rest = ending.report.leftOver; !rest.empty()) {
         if (options.raw) {
-            output.Append({reinterpret_cast<const char*>(rest.data()), rest.size()}, 0);
+            output.Append(CharactersOf(rest), 0);
         } else {
             session.Warn(fmt::format("the last {} bytes are no whole record and were left out", rest.size()));
         }

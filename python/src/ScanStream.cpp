@@ -42,7 +42,10 @@ ScanStream::~ScanStream() {
 void ScanStream::Run() {
     std::exception_ptr failure;
     try {
-        RunScan(*instrument_->opened_, settings_, *this, report_);
+        RunScan(
+            *instrument_->opened_, settings_,
+            [this](auto records, std::uint64_t milliseconds) { TakeRecords(records, milliseconds); },
+            report_);
     } catch (const Failure& failed) {
         const bool isShort = report_.hasStoppedEarly;
         failure = std::make_exception_ptr(

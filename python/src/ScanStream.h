@@ -20,11 +20,11 @@ namespace Varnholt::Python {
 
 /// A scan that runs on a thread of its own, and the records that have come and were not taken yet: a MiB at
 /// most, then the instrument waits. One thread takes them; any may close it.
-class ScanStream final : private Service::RecordSink {
+class ScanStream final {
   public:
     /// While it is the calling thread's turn with the instrument.
     ScanStream(std::shared_ptr<Instrument> instrument, const Service::ScanSettings& settings, bool asBytes);
-    ~ScanStream() override;
+    ~ScanStream();
     ScanStream(const ScanStream&) = delete;
     ScanStream& operator=(const ScanStream&) = delete;
 
@@ -47,7 +47,7 @@ class ScanStream final : private Service::RecordSink {
         std::uint64_t milliseconds = 0;  ///< of the scan when the last of them came
     };
 
-    void TakeRecords(std::span<const std::uint8_t> records, std::uint64_t milliseconds) override;
+    void TakeRecords(std::span<const std::uint8_t> records, std::uint64_t milliseconds);
     std::size_t Append(std::span<const std::uint8_t> records);
     void Run();
     bool HasEnough() const;

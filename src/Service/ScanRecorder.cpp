@@ -39,7 +39,7 @@ void ScanRecorder::Take(std::span<const std::uint8_t> data) {
 
 void ScanRecorder::PassOn(std::span<const std::uint8_t> records) {
     if (!records.empty()) {
-        sink_.TakeRecords(records, milliseconds_);
+        sink_(records, milliseconds_);
     }
 }
 

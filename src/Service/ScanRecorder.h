@@ -1,6 +1,7 @@
 #pragma once
 
 #include <exception>
+#include <functional>
 #include <vector>
 
 #include "DeviceDriver/Ostra/LowLevel/ScanReceiver.h"
@@ -9,14 +10,9 @@
 
 namespace Varnholt::Service {
 
-/// Where the records of a scan go.
-class RecordSink {
-  public:
-    virtual ~RecordSink() = default;
-    /// Some whole records, one behind the other; `milliseconds` from the start they came, with one transfer.
-    /// What is thrown ends the scan.
-    virtual void TakeRecords(std::span<const std::uint8_t> records, std::uint64_t milliseconds) = 0;
-};
+/// Takes some whole records, one behind the other; `milliseconds` from the start they came, with one
+/// transfer. What it throws ends the scan.
+using RecordSink = std::function<void(std::span<const std::uint8_t> records, std::uint64_t milliseconds)>;
 
 /// How far a scan came.
 struct ScanReport {
@@ -31,7 +27,7 @@ class ScanRecorder final : public DeviceDriver::Ostra::LowLevel::ScanReceiver {
   public:
     /// What is referred to outlives the object. The report says what has come, and the progress is told, each
     /// time when some more has been passed on.
-    ScanRecorder(std::uint32_t recordSize, RecordSink& recordSink, ScanReport& scanReport,
+    ScanRecorder(std::uint32_t recordSize, const RecordSink& recordSink, ScanReport& scanReport,
                  Progress& scanProgress)
         : recordSize_(recordSize), sink_(recordSink), report_(scanReport), progress_(scanProgress) {}
 
@@ -46,7 +42,7 @@ class ScanRecorder final : public DeviceDriver::Ostra::LowLevel::ScanReceiver {
     void PassOn(std::span<const std::uint8_t> records);
 
     const std::uint32_t recordSize_;
-    RecordSink& sink_;
+    const RecordSink& sink_;
     ScanReport& report_;  ///< its rest is a record that is not whole yet
     Progress& progress_;
     ElapsedTime time_;

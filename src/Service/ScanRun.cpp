@@ -59,7 +59,7 @@ void Stream(OpenedInstrument& instrument, const ScanSettings& settings, ScanReco
 
 }  // namespace
 
-void RunScan(OpenedInstrument& instrument, const ScanSettings& settings, RecordSink& sink,
+void RunScan(OpenedInstrument& instrument, const ScanSettings& settings, const RecordSink& sink,
              ScanReport& report) {
     const auto progress = instrument.UsedContext().Told().StartProgress("scanning", settings.total, "B");
     report = {};

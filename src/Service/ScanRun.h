@@ -21,7 +21,7 @@ struct ScanSettings {
 /// Scans with an instrument that is prepared, until the total is there, the instrument stops, the sink fails
 /// or the user wants to end. `report` is right after a failure too. A scan that ends on this side leaves an
 /// instrument that has been reset.
-void RunScan(OpenedInstrument& instrument, const ScanSettings& settings, RecordSink& sink,
+void RunScan(OpenedInstrument& instrument, const ScanSettings& settings, const RecordSink& sink,
              ScanReport& report);
 
 }  // namespace Varnholt::Service
