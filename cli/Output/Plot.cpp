@@ -11,26 +11,8 @@
 namespace Varnholt::Cli {
 namespace {
 
-/// A raster of dots; row 0 is at the bottom.
-class Raster final {
-  public:
-    Raster(int dotColumns, int dotRows)
-        : columns(dotColumns), rows(dotRows), dots_(static_cast<std::size_t>(dotColumns * dotRows)) {}
-
-    void Set(int column, int row) { dots_[IndexOf(column, row)] = true; }
-    bool Get(int column, int row) const { return column < columns && dots_[IndexOf(column, row)]; }
-
-    const int columns;
-    const int rows;
-
-  private:
-    std::size_t IndexOf(int column, int row) const {
-        return static_cast<std::size_t>(row) * static_cast<std::size_t>(columns) +
-               static_cast<std::size_t>(column);
-    }
-
-    std::vector<bool> dots_;
-};
+/// Rows of dots, from the bottom up.
+using Raster = std::vector<std::vector<bool>>;
 
 constexpr int DotColumns = 2;  // of a Braille character
 constexpr int DotRows = 4;
@@ -62,7 +44,7 @@ struct Scale {
 
 /// Each column of dots stands for the values that fall into it; neighbouring columns are connected.
 Raster Draw(std::span<const double> values, const Scale& scale, int columns, int rows) {
-    Raster raster(columns, rows);
+    Raster raster(static_cast<std::size_t>(rows), std::vector<bool>(static_cast<std::size_t>(columns)));
     int before = -1;
     for (int column = 0; column < columns; ++column) {
         const auto count = static_cast<std::int64_t>(values.size());
@@ -85,11 +67,17 @@ Raster Draw(std::span<const double> values, const Scale& scale, int columns, int
             highest = std::max(highest, before - 1);
         }
         for (int row = std::max(lowest, 0); latest >= 0 && row <= highest; ++row) {
-            raster.Set(column, row);
+            raster[static_cast<std::size_t>(row)][static_cast<std::size_t>(column)] = true;
         }
         before = latest;
     }
     return raster;
+}
+
+bool HasDot(const Raster& raster, int column, int row) {
+    const std::vector<bool>& dots = raster[static_cast<std::size_t>(row)];
+    const auto place = static_cast<std::size_t>(column);
+    return place < dots.size() && dots[place];
 }
 
 std::string BrailleCell(const Raster& raster, int column, int row) {
@@ -98,7 +86,7 @@ std::string BrailleCell(const Raster& raster, int column, int row) {
     unsigned pattern = 0;
     for (int y = 0; y < DotRows; ++y) {
         for (int x = 0; x < DotColumns; ++x) {
-            if (raster.Get(column * DotColumns + x, row * DotRows + y)) {
+            if (HasDot(raster, column * DotColumns + x, row * DotRows + y)) {
                 pattern |= bits[y][x];
             }
         }
@@ -110,33 +98,7 @@ std::string BrailleCell(const Raster& raster, int column, int row) {
             static_cast<char>(0x80 | (pattern & 0x3F))};
 }
 
-std::string Label(double value) {
-    return fmt::format("{:.5g}", value);
-}
-
-/// What a plot needs to know before its first line is printed.
-class Plot final {
-  public:
-    Plot(std::span<const double> values, const PlotStyle& style);
-
-    void PrintLines(std::ostream& stream) const;
-    void PrintAxis(std::ostream& stream) const;
-
-  private:
-    static Scale ScaleOf(std::span<const double> values);
-
-    const PlotStyle& style_;
-    const Scale scale_;
-    const int height_;  ///< lines
-    const int dotRows_;
-    const std::string top_, middle_, bottom_;  ///< labels
-    const int labelWidth_;
-    const int count_;  ///< values
-    const int width_;  ///< columns
-    const Raster raster_;
-};
-
-Scale Plot::ScaleOf(std::span<const double> values) {
+Scale ScaleOf(std::span<const double> values) {
     Scale scale;
     for (const double value : values) {
         if (std::isfinite(value)) {
@@ -151,60 +113,30 @@ int HeightOf(const PlotStyle& style) {
     return std::max(style.height, 2);
 }
 
-/// The value in the middle of the labelled line.
-std::string MiddleLabel(const Scale& scale, int height, bool braille) {
-    const int rowsOfLine = braille ? DotRows : 1;
-    const int line = height - 1 - height / 2;  // from the bottom
-    const double dot = line * rowsOfLine + (rowsOfLine - 1) / 2.0;
-    return Label(scale.low + (scale.high - scale.low) * dot / (height * rowsOfLine - 1));
+/// Of the three lines that have one: top, bottom, and the value in the middle of the line between.
+std::vector<std::string> LabelsOf(const Scale& scale, int height, int rowsOfLine) {
+    std::vector<std::string> labels(static_cast<std::size_t>(height));
+    const int lineAbove = height - 1 - height / 2;  // from the bottom
+    const double dot = lineAbove * rowsOfLine + (rowsOfLine - 1) / 2.0;
+    const double middle = scale.low + (scale.high - scale.low) * dot / (height * rowsOfLine - 1);
+    labels[static_cast<std::size_t>(height / 2)] = fmt::format("{:.5g}", middle);
+    labels.front() = fmt::format("{:.5g}", scale.high);
+    labels.back() = fmt::format("{:.5g}", scale.low);
+    return labels;
 }
 
-int WidthOfLabels(std::initializer_list<std::size_t> widths) {
-    return static_cast<int>(std::max(widths));
-}
-
-Plot::Plot(std::span<const double> values, const PlotStyle& style)
-    : style_(style),
-      scale_(ScaleOf(values)),
-      height_(HeightOf(style)),
-      dotRows_(height_ * (style.braille ? DotRows : 1)),
-      top_(Label(scale_.high)),
-      middle_(height_ > 2 ? MiddleLabel(scale_, height_, style.braille) : ""),
-      bottom_(Label(scale_.low)),
-      labelWidth_(WidthOfLabels({top_.size(), middle_.size(), bottom_.size()})),
-      count_(static_cast<int>(std::min<std::size_t>(values.size(), 100000))),
-      width_(std::clamp(style.braille ? (count_ + DotColumns - 1) / DotColumns : count_, 1,
-                        std::max(style.width - static_cast<int>(style.indent.size()) - labelWidth_ - 2, 1))),
-      raster_(Draw(values, scale_, std::max(std::min(width_ * (style.braille ? DotColumns : 1), count_), 1),
-                   dotRows_)) {}
-
-void Plot::PrintLines(std::ostream& stream) const {
-    for (int line = 0; line < height_; ++line) {
-        const bool isLabelled = line == 0 || line == height_ - 1 || line == height_ / 2;
-        const std::string& label = line == 0 ? top_ : line == height_ - 1 ? bottom_ : middle_;
-        std::string text = fmt::format("{}{:>{}} {}", style_.indent, isLabelled ? label : "", labelWidth_,
-                                       style_.braille ? (isLabelled ? "┤" : "│") : (isLabelled ? "+" : "|"));
-        const int row = height_ - 1 - line;
-        for (int column = 0; column < width_; ++column) {
-            text += style_.braille ? BrailleCell(raster_, column, row) : raster_.Get(column, row) ? "*" : " ";
-        }
-        text.erase(text.find_last_not_of(' ') + 1);
-        stream << text << '\n';
-    }
-}
-
-void Plot::PrintAxis(std::ostream& stream) const {
+/// Under `width` columns that stand for `count` values, behind labels of some width.
+void PrintAxis(std::ostream& stream, const PlotStyle& style, int labelWidth, int width, int count) {
     constexpr int labelEvery = 16;
-    const std::size_t begin = style_.indent.size() + static_cast<std::size_t>(labelWidth_) + 2;
-    std::string axis =
-        fmt::format("{}{:>{}}{}", style_.indent, "", labelWidth_ + 1, style_.braille ? "└" : "+");
+    const std::size_t begin = style.indent.size() + static_cast<std::size_t>(labelWidth) + 2;
+    std::string axis = fmt::format("{}{:>{}}{}", style.indent, "", labelWidth + 1, style.braille ? "└" : "+");
     std::string labels(begin, ' ');
-    for (int column = 0; column < width_; ++column) {
+    for (int column = 0; column < width; ++column) {
         const bool isLabelled = column % labelEvery == 0;
-        axis += style_.braille ? (isLabelled ? "┬" : "─") : (isLabelled ? "+" : "-");
-        const std::string index = std::to_string(static_cast<std::int64_t>(column) * count_ / width_);
+        axis += style.braille ? (isLabelled ? "┬" : "─") : (isLabelled ? "+" : "-");
+        const std::string index = std::to_string(static_cast<std::int64_t>(column) * count / width);
         const std::size_t at = begin + static_cast<std::size_t>(column);
-        const bool fits = at + index.size() <= static_cast<std::size_t>(std::max(style_.width, 0));
+        const bool fits = at + index.size() <= static_cast<std::size_t>(std::max(style.width, 0));
         if (isLabelled && (column == 0 || fits)) {
             labels.resize(std::max(labels.size(), at), ' ');
             labels += index;
@@ -220,9 +152,33 @@ int PlotLines(const PlotStyle& style) {
 }
 
 void PrintPlot(std::ostream& stream, std::span<const double> values, const PlotStyle& style) {
-    const Plot plot(values, style);
-    plot.PrintLines(stream);
-    plot.PrintAxis(stream);
+    const Scale scale = ScaleOf(values);
+    const int height = HeightOf(style);
+    const int columnDots = style.braille ? DotColumns : 1;
+    const int rowDots = style.braille ? DotRows : 1;
+    const std::vector<std::string> labels = LabelsOf(scale, height, rowDots);
+    const auto labelWidth =
+        static_cast<int>(std::ranges::max_element(labels, {}, &std::string::size)->size());
+    const int count = static_cast<int>(std::min<std::size_t>(values.size(), 100000));
+    const int room = style.width - static_cast<int>(style.indent.size()) - labelWidth - 2;
+    const int width = std::clamp((count + columnDots - 1) / columnDots, 1, std::max(room, 1));
+    const Raster raster =
+        Draw(values, scale, std::max(std::min(width * columnDots, count), 1), height * rowDots);
+    for (int line = 0; line < height; ++line) {
+        const std::string& label = labels[static_cast<std::size_t>(line)];
+        std::string text =
+            fmt::format("{}{:>{}} {}", style.indent, label, labelWidth,
+                        style.braille ? (label.empty() ? "│" : "┤") : (label.empty() ? "|" : "+"));
+        const int row = height - 1 - line;
+        for (int column = 0; column < width; ++column) {
+            text += style.braille                 ? BrailleCell(raster, column, row)
+                    : HasDot(raster, column, row) ? "*"
+                                                  : " ";
+        }
+        text.erase(text.find_last_not_of(' ') + 1);
+        stream << text << '\n';
+    }
+    PrintAxis(stream, style, labelWidth, width, count);
 }
 
 }  // namespace Varnholt::Cli
