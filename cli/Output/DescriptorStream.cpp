@@ -5,24 +5,21 @@
 
 namespace Varnholt::Cli {
 
-DescriptorStream::DescriptorStream(OutputDescriptor target, const Service::Interruption& userInterruption,
-                                   Lost lost)
-    : std::ostream(nullptr), buffer_(std::move(target), userInterruption, lost) {
-    rdbuf(&buffer_);
-}
-
-DescriptorStream::Buffer::Buffer(OutputDescriptor openTarget, const Service::Interruption& userInterruption,
-                                 Lost whatIsLost)
-    : target_(std::move(openTarget)), interruption_(userInterruption), lost_(whatIsLost) {
+DescriptorStream::DescriptorStream(OutputDescriptor openTarget, const Service::Interruption& userInterruption,
+                                   Lost whatIsLost)
+    : std::ostream(static_cast<std::streambuf*>(this)),
+      target_(std::move(openTarget)),
+      interruption_(userInterruption),
+      lost_(whatIsLost) {
     setp(room_.data(), room_.data() + room_.size());
 }
 
-DescriptorStream::Buffer::~Buffer() {
-    Buffer::sync();
+DescriptorStream::~DescriptorStream() {
+    DescriptorStream::sync();
 }
 
 /// How many of them count as written.
-std::size_t DescriptorStream::Buffer::Write(std::span<const char> bytes) {
+std::size_t DescriptorStream::Write(std::span<const char> bytes) {
     const OutputDescriptor::Outcome outcome = target_.Write(bytes, interruption_);
     if (!outcome.error || lost_ == Lost::IsIgnored) {
         return bytes.size();
@@ -31,7 +28,7 @@ std::size_t DescriptorStream::Buffer::Write(std::span<const char> bytes) {
     return outcome.accepted;
 }
 
-int DescriptorStream::Buffer::sync() {
+int DescriptorStream::sync() {
     const auto held = static_cast<std::size_t>(pptr() - pbase());
     const std::size_t written = Write({pbase(), held});
     // What is left stays in front, so that nothing is written twice.
@@ -41,19 +38,19 @@ int DescriptorStream::Buffer::sync() {
     return written == held ? 0 : -1;
 }
 
-DescriptorStream::Buffer::int_type DescriptorStream::Buffer::overflow(int_type character) {
+int DescriptorStream::overflow(int character) {
     if (sync() != 0) {
-        return traits_type::eof();
+        return std::char_traits<char>::eof();
     }
-    if (!traits_type::eq_int_type(character, traits_type::eof())) {
-        *pptr() = traits_type::to_char_type(character);
+    if (!std::char_traits<char>::eq_int_type(character, std::char_traits<char>::eof())) {
+        *pptr() = std::char_traits<char>::to_char_type(character);
         pbump(1);
     }
-    return traits_type::not_eof(character);
+    return std::char_traits<char>::not_eof(character);
 }
 
 /// What is larger than the buffer goes past it; the answer is then exact.
-std::streamsize DescriptorStream::Buffer::xsputn(const char* text, std::streamsize size) {
+std::streamsize DescriptorStream::xsputn(const char* text, std::streamsize size) {
     if (size <= epptr() - pptr()) {
         std::memcpy(pptr(), text, static_cast<std::size_t>(size));
         pbump(static_cast<int>(size));
