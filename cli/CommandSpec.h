@@ -1,36 +1,29 @@
 #pragma once
 
-#include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
 #include <vector>
 
 namespace CLI {
 class App;
-class Option;
-}  // namespace CLI
+}
 
 namespace Varnholt::Cli {
 
-/// An option, flag or argument of a command. Each operation answers the option, so that they can be chained.
-class OptionSpec final {
-  public:
-    explicit OptionSpec(CLI::Option* parserOption) : option_(parserOption) {}
+/// What an option, flag or argument may have beside its names, its target and its text.
+struct OptionTraits {
+    struct Range {
+        double lowest, highest;
+    };
 
-    /// What stands for the value in the help.
-    OptionSpec& Type(const char* placeholder);
-    /// The heading under which the help lists it.
-    OptionSpec& Group(const char* heading);
-    OptionSpec& Required();
-    /// Another option, by its name, that must not be there as well.
-    OptionSpec& Excludes(const char* name);
-    OptionSpec& Between(double lowest, double highest);
-    OptionSpec& OneOf(const std::vector<std::string>& values);
-    /// `check` answers what is wrong with a text; empty: nothing.
-    OptionSpec& Check(std::function<std::string(const std::string& text)> check);
-
-  private:
-    CLI::Option* option_;
+    const char* type = nullptr;  ///< stands for the value in the help
+    bool isRequired = false;
+    std::vector<const char*> excludes{};  ///< other options, by name, that must not be there as well
+    std::optional<Range> between{};
+    std::vector<std::string> oneOf{};
+    /// Answers what is wrong with a text; empty: nothing.
+    std::string (*check)(const std::string& text) = nullptr;
 };
 
 /// A command, or a group of commands, while the command line is being built: the parser behind it is seen by
@@ -38,17 +31,19 @@ class OptionSpec final {
 /// the option is not given. A text may not be empty: in a script that is a variable that was never set.
 class CommandSpec final {
   public:
-    explicit CommandSpec(CLI::App* parserCommand) : command_(parserCommand) {}
+    explicit CommandSpec(CLI::App* parserCommand, const char* optionsHeading = nullptr)
+        : command_(parserCommand), heading_(optionsHeading) {}
 
     CommandSpec AddCommand(const char* name, const char* about);
     /// A group: one of its commands must be named.
     CommandSpec AddGroup(const char* name, const char* about);
 
-    /// For a `std::string`, a `double`, an unsigned integer of 16 or 32 bits, or several texts or 16-bit
-    /// integers.
+    /// The same command, for options that the help lists under this heading.
+    CommandSpec Under(const char* heading) const { return CommandSpec(command_, heading); }
+    /// For a `bool`, which makes it a flag, a `std::string`, a `double`, an unsigned integer of 16 or 32
+    /// bits, or several texts or 16-bit integers.
     template <class Target>
-    OptionSpec Add(const char* names, Target& target, const char* about);
-    OptionSpec AddFlag(const char* names, bool& target, const char* about);
+    void Add(const char* names, Target& target, const char* about, const OptionTraits& traits = {});
 
     /// Text behind the options.
     void Footer(const char* text);
@@ -57,6 +52,7 @@ class CommandSpec final {
 
   private:
     CLI::App* command_;
+    const char* heading_;
 };
 
 }  // namespace Varnholt::Cli

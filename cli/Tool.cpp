@@ -138,12 +138,13 @@ void BuildCommandLine(CLI::App& app, InstrumentOptions& instrument, Session& ses
     app.set_help_flag("-h,--help", "print this help");
     CommandSpec tool(&app);
     tool.Add("--capture", session.captureFile,
-             "record the USB traffic in a pcapng file, made when an instrument is opened")
-        .Type("FILE");
-    tool.AddFlag("-v,--verbose", session.verbose,
-                 "tell on standard error what is sent to the instrument and comes from it");
+             "record the USB traffic in a pcapng file, made when an instrument is opened", {.type = "FILE"});
+    tool.Add("-v,--verbose", session.verbose,
+             "tell on standard error what is sent to the instrument and comes from it");
     AddInstrumentOptions(tool, instrument);
-    for (const AddCommand add : Commands) {
+    // In the order in which the help lists them.
+    for (const auto add : {AddList, AddReadout, AddScan, AddIdentify, AddReset, AddMonitor, AddWriteImage,
+                           AddEeprom, AddCalibration, AddLog, AddRam, AddBinary, AddWord}) {
         add(tool, session);
     }
     AddSystemCommands(tool, session);

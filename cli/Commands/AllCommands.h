@@ -1,7 +1,5 @@
 #pragma once
 
-#include <array>
-
 #include "CommandSpec.h"
 
 namespace Varnholt::Cli {
@@ -17,6 +15,8 @@ void AddReset(CommandSpec app, Session& session);
 void AddMonitor(CommandSpec app, Session& session);
 void AddWriteImage(CommandSpec app, Session& session);
 void AddEeprom(CommandSpec app, Session& session);
+void AddEepromViews(CommandSpec eepromGroup,
+                    Session& session);  ///< of that group, those that look into images
 void AddCalibration(CommandSpec app, Session& session);
 void AddLog(CommandSpec app, Session& session);
 void AddRam(CommandSpec app, Session& session);
@@ -26,15 +26,5 @@ void AddDoctor(CommandSpec app, Session& session);
 
 /// On Linux only; see SystemCommands.h.
 void AddRegister(CommandSpec app, Session& session);
-
-using AddCommand = void (*)(CommandSpec app, Session& session);
-
-/// The commands in the order in which the help lists them.
-inline constexpr std::array Commands{
-    AddCommand{AddList},        AddCommand{AddReadout}, AddCommand{AddScan},       AddCommand{AddIdentify},
-    AddCommand{AddReset},       AddCommand{AddMonitor}, AddCommand{AddWriteImage}, AddCommand{AddEeprom},
-    AddCommand{AddCalibration}, AddCommand{AddLog},     AddCommand{AddRam},        AddCommand{AddBinary},
-    AddCommand{AddWord},
-};
 
 }  // namespace Varnholt::Cli

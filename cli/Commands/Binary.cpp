@@ -1,9 +1,9 @@
+#include <fmt/format.h>
+
 #include "Commands/AllCommands.h"
-#include "Commands/CommonOptions.h"
 #include "Memory/InputFile.h"
 #include "Memory/MemoryTarget.h"
 #include "Memory/NewFile.h"
-#include "Output/Json.h"
 #include "Protocol/EepromMap.h"
 #include "Service/Memory/ImageEdit.h"
 
@@ -12,26 +12,21 @@ namespace {
 
 using namespace Service;
 
-struct GetBinaryOptions {
-    MemoryOptions memory;
+struct GetBinaryOptions : MemoryOptions {
     NewFileOptions file;
 };
 
 void GetBinary(Session& session, const GetBinaryOptions& options) {
     const NewFile file(session, options.file);
-    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+    const MemoryTarget target(session, options, MemoryTarget::Use::Read);
     const std::vector<std::uint8_t> block = BinaryBlockOf(target.Image());
     file.Write(block);
-    if (options.memory.json) {
-        session.Print({{"source", target.Name()}, {"file", options.file.name}, {"bytes", block.size()}});
-    } else {
-        session.Out() << block.size() << " bytes of " << target.Name() << " written to " << file.ShownName()
-                      << '\n';
-    }
+    session.Print(
+        options.json, {{"source", target.Name()}, {"file", options.file.name}, {"bytes", block.size()}},
+        fmt::format("{} bytes of {} written to {}\n", block.size(), target.Name(), file.ShownName()));
 }
 
-struct PutBinaryOptions {
-    MemoryOptions memory;
+struct PutBinaryOptions : MemoryOptions {
     ChangeOptions change;
     std::string file;
 };
@@ -40,7 +35,7 @@ void PutBinary(Session& session, const PutBinaryOptions& options) {
     const std::vector<std::uint8_t> block =
         ReadFileOfSize(session, options.file, Protocol::EepromMap::BinarySize, "a binary block",
                        "`ostra binary get FILE` saves the one of an instrument");
-    MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
+    MemoryTarget target(session, options, MemoryTarget::Use::Change);
     target.Change(WithBinaryBlock(target.Image(), block), options.change, Granularity::Elements,
                   {{"file", options.file}});
 }
@@ -52,13 +47,13 @@ void AddBinary(CommandSpec app, Session& session) {
 
     auto [get, getOptions] = NewCommand(group, session, "get", "save the binary block in a file", GetBinary);
     AddNewFileOptions(get, "FILE", getOptions.file);
-    AddMemoryOptions(get, getOptions.memory);
+    AddMemoryOptions(get, getOptions);
 
     auto [put, putOptions] =
         NewCommand(group, session, "put", "write the binary block from a file", PutBinary);
-    put.Add("FILE", putOptions.file, "1904 bytes; `-` is standard input").Required();
+    put.Add("FILE", putOptions.file, "1904 bytes; `-` is standard input", {.isRequired = true});
     AddChangeOptions(put, putOptions.change);
-    AddMemoryOptions(put, putOptions.memory);
+    AddMemoryOptions(put, putOptions);
 }
 
 }  // namespace Varnholt::Cli

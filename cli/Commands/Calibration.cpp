@@ -1,10 +1,5 @@
-#include <fmt/format.h>
-
 #include "Commands/AllCommands.h"
-#include "Commands/CommonOptions.h"
 #include "Memory/MemoryTarget.h"
-#include "Output/Json.h"
-#include "Output/Rows.h"
 #include "Output/ValueList.h"
 #include "Service/Memory/ImageEdit.h"
 #include "Service/Memory/ImageModel.h"
@@ -24,23 +19,21 @@ void ShowCalibration(Session& session, const MemoryOptions& options) {
     }
 }
 
-struct SetCalibrationOptions {
-    MemoryOptions memory;
+struct SetCalibrationOptions : MemoryOptions {
     ChangeOptions change;
     std::vector<std::string> assignments;
 };
 
 void SetCalibration(Session& session, const SetCalibrationOptions& options) {
     const std::vector<Assignment> assignments = ParseAssignments(options.assignments);
-    MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
+    MemoryTarget target(session, options, MemoryTarget::Use::Change);
     const EditedImage edited = target.Interpret(
         [&assignments](const EepromImage& image) { return WithCalibration(image, assignments); });
-    Rows changes({{"ID", "id", Table::Align::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}});
+    Rows changes({{"ID", "id", Rows::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}});
     for (const ValueChange& change : edited.changes) {
         changes.Add({change.id, CellOf(change.before), "->", CellOf(change.after)});
     }
-    target.Change(edited.image, options.change, Granularity::Elements, {{"changes", changes.AsJson()}},
-                  [&] { changes.Print(session.Out()); });
+    target.Change(edited.image, options.change, changes);
 }
 
 }  // namespace
@@ -57,9 +50,10 @@ void AddCalibration(CommandSpec app, Session& session) {
         "set calibration values: the EEPROM is read, changed as a whole and proven, backed up, written "
         "where it differs, and read back",
         SetCalibration);
-    set.Add("ID=VALUE", setOptions.assignments, "new values; elements with commas: 1000=0.5,1.5").Required();
+    set.Add("ID=VALUE", setOptions.assignments, "new values; elements with commas: 1000=0.5,1.5",
+            {.isRequired = true});
     AddChangeOptions(set, setOptions.change);
-    AddMemoryOptions(set, setOptions.memory);
+    AddMemoryOptions(set, setOptions);
 }
 
 }  // namespace Varnholt::Cli

@@ -21,27 +21,32 @@ Service::FoundInstrument ChooseInstrument(Session& session, const InstrumentOpti
     return found;
 }
 
-void AddInstrumentOptions(CommandSpec command, InstrumentOptions& options) {
-    command
-        .Add("-d,--device", options.device,
-             "instrument: its identifier or the end of it, as `ostra list` shows, or chip:ID (default: the "
-             "first)")
-        .Type("NAME")
-        .Group(Heading);
-    AddTransportOption(command, options);
+Service::OpenedInstrument OpenInstrument(Session& session, const InstrumentOptions& options, Choice choice) {
+    return {session.Context(), ChooseInstrument(session, options, choice)};
 }
 
 void AddTransportOption(CommandSpec command, InstrumentOptions& options) {
-    command
-        .Add("--transport", options.transport,
-             "the way to the instrument: native or usbio (default: what this machine prefers)")
-        .OneOf({"native", "usbio"})
-        .Type("WAY")
-        .Group(Heading);
+    command.Under(Heading).Add(
+        "--transport", options.transport,
+        "the way to the instrument: native or usbio (default: what this machine prefers)",
+        {.type = "WAY", .oneOf = {"native", "usbio"}});
+}
+
+void AddInstrumentOptions(CommandSpec command, InstrumentOptions& options) {
+    command.Under(Heading).Add("-d,--device", options.device,
+                               "instrument: its identifier or the end of it, as `ostra list` shows, or "
+                               "chip:ID (default: the first)",
+                               {.type = "NAME"});
+    AddTransportOption(command, options);
 }
 
 void AddJsonFlag(CommandSpec command, bool& json) {
-    command.AddFlag("--json", json, "print JSON").Group("Output");
+    command.Under("Output").Add("--json", json, "print JSON");
+}
+
+void AddCommonOptions(CommandSpec command, InstrumentOptions& options) {
+    AddInstrumentOptions(command, options);
+    AddJsonFlag(command, options.json);
 }
 
 }  // namespace Varnholt::Cli

@@ -3,15 +3,17 @@
 #include <memory>
 
 #include "CommandSpec.h"
-#include "Service/Instruments.h"
+#include "Service/OpenedInstrument.h"
 #include "Session.h"
 
 namespace Varnholt::Cli {
 
-/// Which instrument a command works on, and how it reaches it.
+/// Which instrument a command works on, how it reaches it, and how it prints what comes of it. The options of
+/// a command derive from it.
 struct InstrumentOptions {
     std::string device;     ///< identifier or the end of one, or "chip:" and a chip id; empty: the first
     std::string transport;  ///< "native", "usbio" or empty
+    bool json = false;
 };
 
 /// What happens when several instruments are connected and none is named.
@@ -22,6 +24,9 @@ enum class Choice {
 /// Over the transport that the options name, which is then the session's.
 Service::FoundInstrument ChooseInstrument(Session& session, const InstrumentOptions& options,
                                           Choice choice = Choice::FirstWillDo);
+/// Chooses and opens it.
+Service::OpenedInstrument OpenInstrument(Session& session, const InstrumentOptions& options,
+                                         Choice choice = Choice::FirstWillDo);
 
 /// A command and its options, which live as long as the command line.
 template <class Options>
@@ -40,9 +45,11 @@ CommandWithOptions<Options> NewCommand(CommandSpec parent, Session& session, con
     return {command, *options};
 }
 
+void AddTransportOption(CommandSpec command, InstrumentOptions& options);
 /// --device and --transport.
 void AddInstrumentOptions(CommandSpec command, InstrumentOptions& options);
-void AddTransportOption(CommandSpec command, InstrumentOptions& options);
 void AddJsonFlag(CommandSpec command, bool& json);
+/// All three.
+void AddCommonOptions(CommandSpec command, InstrumentOptions& options);
 
 }  // namespace Varnholt::Cli

@@ -1,12 +1,9 @@
 #include <fmt/format.h>
 #include <fmt/ostream.h>
 
-#include "Commands/CommonOptions.h"
-#include "Commands/Eeprom.h"
+#include "Commands/AllCommands.h"
 #include "Memory/InputFile.h"
 #include "Memory/MemoryTarget.h"
-#include "Output/Json.h"
-#include "Output/Rows.h"
 #include "Output/ValueList.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
@@ -24,11 +21,6 @@ using namespace Service;
 namespace Map = Protocol::EepromMap;
 namespace Ids = Protocol::PropertyIds;
 
-struct ViewOptions {
-    MemoryOptions memory;
-    bool numbers = false;
-};
-
 Json JsonOfCopy(const LogCopy& copy) {
     return {{"readable", copy.isReadable},
             {"valid", copy.isValid},
@@ -37,7 +29,7 @@ Json JsonOfCopy(const LogCopy& copy) {
 }
 
 Json JsonOfImage(const MemoryTarget& target, ImageModel& model, const LogCopies& copies) {
-    Json entries{Json::Array()};
+    Json entries = Json::Array();
     const ImageModel::Properties table = model.Table();
     for (const auto& [id, address] : table.GetDatastore()) {
         entries.Append({{"id", id}, {"address", address.AsLong()}});
@@ -75,11 +67,15 @@ void PrintRawAreas(Session& session, const EepromImage& image) {
     }
 }
 
-void ShowEeprom(Session& session, const ViewOptions& options) {
-    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+struct ShowOptions : MemoryOptions {
+    bool numbers = false;
+};
+
+void ShowEeprom(Session& session, const ShowOptions& options) {
+    const MemoryTarget target(session, options, MemoryTarget::Use::Read);
     ImageModel model = target.Interpret([](const EepromImage& image) { return ImageModel(image); });
     const LogCopies copies = ReadLogCopies(target.Image());
-    if (options.memory.json) {
+    if (options.json) {
         session.Print(JsonOfImage(target, model, copies));
         return;
     }
@@ -95,27 +91,22 @@ void ShowEeprom(Session& session, const ViewOptions& options) {
     PrintRawAreas(session, target.Image());
 }
 
-void Check(Session& session, const ViewOptions& options) {
-    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+void Check(Session& session, const MemoryOptions& options) {
+    const MemoryTarget target(session, options, MemoryTarget::Use::Read);
     const std::vector<ImageFinding> findings = CheckImage(target.Image());
     const bool isSane = IsSane(findings);
     Rows rows({{"", "severity"}, {"", "area"}, {"", "text"}});
     for (const ImageFinding& finding : findings) {
         rows.Add({NameOf(finding.severity), finding.area, finding.text});
     }
-    if (options.memory.json) {
-        session.Print({{"source", target.Name()}, {"sane", isSane}, {"findings", rows.AsJson()}});
-    } else {
-        rows.Print(session.Out());
-        session.Out() << target.Name() << (isSane ? " can be used\n" : " cannot be used as it is\n");
-    }
+    session.Print(options.json, {{"source", target.Name()}, {"sane", isSane}, {"findings", rows.AsJson()}},
+                  rows.Text() + target.Name() + (isSane ? " can be used\n" : " cannot be used as it is\n"));
     if (!isSane) {
         throw Failure(FailureKind::BadData, target.Name() + " has errors");
     }
 }
 
-struct DiffOptions {
-    MemoryOptions memory;
+struct DiffOptions : MemoryOptions {
     std::string a;
 };
 
@@ -159,10 +150,10 @@ std::string TextOfUnreadable(const ImageDiff& diff, const std::string& a, const 
 
 Rows RowsOf(const std::vector<ImageDiff::Value>& values) {
     Rows rows({{"WHAT", "kind"},
-               {"ID", "id", Table::Align::Right},
+               {"ID", "id", Rows::Right},
                {"DIFFERENCE"},
-               {"", "a", Table::Align::Left, false},
-               {"", "b", Table::Align::Left, false}});
+               {"", "a", Rows::Hidden},
+               {"", "b", Rows::Hidden}});
     for (const ImageDiff::Value& value : values) {
         const bool isWord = value.kind == "word";
         const Rows::Cell a = CellOfSide(value.a, isWord);
@@ -175,10 +166,10 @@ Rows RowsOf(const std::vector<ImageDiff::Value>& values) {
 Rows RowsOf(const std::vector<ImageDiff::Area>& areas) {
     Rows rows({{"AREA", "area"},
                {"ADDRESSES"},
-               {"", "first", Table::Align::Left, false},
-               {"", "last", Table::Align::Left, false},
-               {"BYTES", "differentBytes", Table::Align::Right},
-               {"FIRST AT", "firstDifference", Table::Align::Right}});
+               {"", "first", Rows::Hidden},
+               {"", "last", Rows::Hidden},
+               {"BYTES", "differentBytes", Rows::Right},
+               {"FIRST AT", "firstDifference", Rows::Right}});
     for (const ImageDiff::Area& area : areas) {
         rows.Add({area.name, fmt::format("{} to {}", area.first, area.last), area.first, area.last,
                   area.different, area.firstDifference});
@@ -189,12 +180,12 @@ Rows RowsOf(const std::vector<ImageDiff::Area>& areas) {
 void Diff(Session& session, const DiffOptions& options) {
     const EepromImage a = ReadImageFile(session, options.a);
     const std::string nameOfA = ShownSource(options.a);
-    const MemoryTarget b(session, options.memory, MemoryTarget::Use::Read);
+    const MemoryTarget b(session, options, MemoryTarget::Use::Read);
     const ImageDiff diff = Compare(a, b.Image());
     const std::string unreadable = TextOfUnreadable(diff, nameOfA, b.Name());
     const Rows values = RowsOf(diff.values);
     const Rows areas = RowsOf(diff.areas);
-    if (options.memory.json) {
+    if (options.json) {
         session.Print({{"a", nameOfA},
                        {"b", b.Name()},
                        {"same", diff.IsEmpty()},
@@ -207,11 +198,7 @@ void Diff(Session& session, const DiffOptions& options) {
         if (!unreadable.empty()) {
             session.Warn("calibration and log cannot be compared: " + unreadable);
         }
-        if (!values.IsEmpty()) {
-            values.Print(session.Out());
-            session.Out() << '\n';
-        }
-        areas.Print(session.Out());
+        session.Out() << (values.IsEmpty() ? "" : values.Text() + "\n") << areas.Text();
     }
     if (!diff.IsEmpty()) {
         throw Failure(FailureKind::Different, nameOfA + " and " + b.Name() + " differ");
@@ -223,20 +210,20 @@ void Diff(Session& session, const DiffOptions& options) {
 void AddEepromViews(CommandSpec group, Session& session) {
     auto [show, showOptions] =
         NewCommand(group, session, "show", "show what is in an EEPROM or an image", ShowEeprom);
-    show.AddFlag("--numbers", showOptions.numbers, "show vectors as numbers, not as plots").Group("Output");
-    AddMemoryOptions(show, showOptions.memory, "FILE");
+    show.Under("Output").Add("--numbers", showOptions.numbers, "show vectors as numbers, not as plots");
+    AddMemoryOptions(show, showOptions, "FILE");
 
     auto [check, checkOptions] = NewCommand(
         group, session, "check",
         "check table, logs, checksums and areas, and tell what the driver would use of them", Check);
-    AddMemoryOptions(check, checkOptions.memory, "FILE");
+    AddMemoryOptions(check, checkOptions, "FILE");
 
     auto [diff, diffOptions] = NewCommand(group, session, "diff",
                                           "compare two images, or an image and an instrument, by value and "
                                           "by area; exit code 9 when they differ",
                                           Diff);
-    diff.Add("A", diffOptions.a, "image file; `-` is standard input").Required();
-    AddMemoryOptions(diff, diffOptions.memory, "B");
+    diff.Add("A", diffOptions.a, "image file; `-` is standard input", {.isRequired = true});
+    AddMemoryOptions(diff, diffOptions, "B");
 }
 
 }  // namespace Varnholt::Cli

@@ -4,20 +4,13 @@
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
 #include "Output/Rows.h"
-#include "Service/OpenedInstrument.h"
 
 namespace Varnholt::Cli {
 namespace {
 
-struct IdentifyOptions {
-    InstrumentOptions instrument;
-    bool json = false;
-};
-
-void Identify(Session& session, const IdentifyOptions& options) {
-    Service::OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options.instrument));
+void Identify(Session& session, const InstrumentOptions& options) {
+    auto instrument = OpenInstrument(session, options);
     const Service::Identity found = instrument.Identify();
-    const std::string name = Service::ShortNameOf(instrument.Identifier());
     const std::array misc{unsigned{found.misc1}, unsigned{found.misc2}, unsigned{found.misc3},
                           unsigned{found.misc4}, unsigned{found.misc5}};
     const std::array parameters{unsigned{found.p1}, unsigned{found.p2}, unsigned{found.p3},
@@ -29,10 +22,10 @@ void Identify(Session& session, const IdentifyOptions& options) {
         Rows::Cell cell;
     };
     Json result;
-    Table table({{}, {}});
+    Rows table({{}, {}});
     for (const Line& line : {
              Line{"identifier", "identifier", instrument.Identifier()},
-             Line{"name", "name", name},
+             Line{"name", "name", Service::ShortNameOf(instrument.Identifier())},
              Line{"chip id", "chipId", found.chipId},
              Line{"MISC m1 to m5", "misc", {inARow(misc), misc}},
              Line{"mode m1 to m6", "mode", {inARow(found.mode), found.mode}},
@@ -40,13 +33,9 @@ void Identify(Session& session, const IdentifyOptions& options) {
              Line{"parameters p1 to p5", "parameters", {inARow(parameters), parameters}},
          }) {
         result.Add(line.member, *line.cell.value);
-        table.AddRow({line.label, line.cell.text});
+        table.Add({line.label, line.cell});
     }
-    if (options.json) {
-        session.Print(result);
-    } else {
-        table.Print(session.Out());
-    }
+    session.Print(options.json, result, table.Text());
 }
 
 }  // namespace
@@ -57,8 +46,7 @@ void AddIdentify(CommandSpec app, Session& session) {
                    "show what an instrument says of itself: chip id, MISC values, mode, "
                    "CPLD, measurement parameters",
                    Identify);
-    AddInstrumentOptions(command, options.instrument);
-    AddJsonFlag(command, options.json);
+    AddCommonOptions(command, options);
 }
 
 }  // namespace Varnholt::Cli

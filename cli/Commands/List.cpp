@@ -1,5 +1,3 @@
-#include <optional>
-
 #include "Commands/AllCommands.h"
 #include "Commands/CommonOptions.h"
 #include "Output/Json.h"
@@ -9,11 +7,9 @@
 namespace Varnholt::Cli {
 namespace {
 
-struct ListOptions {
-    InstrumentOptions instrument;
+struct ListOptions : InstrumentOptions {
     bool candidates = false;
     bool chipId = false;
-    bool json = false;
 };
 
 void List(Session& session, const ListOptions& options) {
@@ -21,14 +17,14 @@ void List(Session& session, const ListOptions& options) {
         PrintCandidates(session, options.json);
         return;
     }
-    session.ChooseTransport(options.instrument.transport);
+    session.ChooseTransport(options.transport);
     const bool isUsbIo = session.Context().UsedTransport() == Service::Context::Transport::UsbIo;
     const std::vector<std::string> connected = ListInstruments(session.Context());
-    Rows instruments({{"", "identifier", Table::Align::Left, false},
+    Rows instruments({{"", "identifier", Rows::Hidden},
                       {"NAME", "name"},
                       {"IDENTIFIER"},
                       {options.chipId ? "CHIP ID" : "", "chipId"},
-                      {"", "problem", Table::Align::Left, false}});
+                      {"", "problem", Rows::Hidden}});
     std::optional<Failure> failure;  // one that is used by others is none
     for (const std::string& identifier : connected) {
         Rows::Cell chipId("", std::nullopt);
@@ -46,11 +42,9 @@ void List(Session& session, const ListOptions& options) {
         }
         instruments.Add({identifier, Service::ShortNameOf(identifier), identifier, chipId, problem});
     }
-    if (options.json) {
-        session.Print({{"transport", isUsbIo ? "usbio" : "native"}, {"instruments", instruments.AsJson()}});
-    } else if (!connected.empty()) {
-        instruments.Print(session.Out());
-    }
+    session.Print(options.json,
+                  {{"transport", isUsbIo ? "usbio" : "native"}, {"instruments", instruments.AsJson()}},
+                  connected.empty() ? "" : instruments.Text());
     Service::FindInstrument(connected, {});  // says what to do when there is none
     if (failure) {
         throw Failure(failure->Kind(), "not every instrument has told its chip id", failure->Advice());
@@ -62,13 +56,12 @@ void List(Session& session, const ListOptions& options) {
 void AddList(CommandSpec app, Session& session) {
     auto [command, options] =
         NewCommand(app, session, "list", "list the instruments that are connected", List);
-    AddTransportOption(command, options.instrument);
-    command.AddFlag("--candidates", options.candidates,
-                    "show the USB devices that could be instruments instead, registered or not");
-    command
-        .AddFlag("--chip-id", options.chipId,
-                 "show the chip ids as well: opens (and thereby resets) the instruments that are free")
-        .Excludes("--candidates");
+    AddTransportOption(command, options);
+    command.Add("--candidates", options.candidates,
+                "show the USB devices that could be instruments instead, registered or not");
+    command.Add("--chip-id", options.chipId,
+                "show the chip ids as well: opens (and thereby resets) the instruments that are free",
+                {.excludes = {"--candidates"}});
     AddJsonFlag(command, options.json);
 }
 

@@ -1,10 +1,5 @@
-#include <fmt/format.h>
-#include <fmt/ostream.h>
-
 #include "Commands/AllCommands.h"
-#include "Commands/CommonOptions.h"
 #include "Memory/MemoryTarget.h"
-#include "Output/Json.h"
 #include "Output/ValueList.h"
 #include "Service/Memory/ImageEdit.h"
 #include "Service/Memory/ImageModel.h"
@@ -14,16 +9,15 @@ namespace {
 
 using namespace Service;
 
-struct ShowLogOptions {
-    MemoryOptions memory;
+struct ShowLogOptions : MemoryOptions {
     bool numbers = false;
 };
 
 void ShowLog(Session& session, const ShowLogOptions& options) {
-    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+    const MemoryTarget target(session, options, MemoryTarget::Use::Read);
     ImageModel model = target.Interpret([](const EepromImage& image) { return ImageModel(image); });
     const LogCopies copies = ReadLogCopies(target.Image());
-    if (options.memory.json) {
+    if (options.json) {
         session.Print({{"source", target.Name()},
                        {"used", copies.Used()},
                        {"mainValid", copies.main.isValid},
@@ -38,16 +32,14 @@ void ShowLog(Session& session, const ShowLogOptions& options) {
     PrintValues(session, model.Log(), options.numbers ? Vectors::Numbers : Vectors::Plotted);
 }
 
-struct ResetLogOptions {
-    MemoryOptions memory;
+struct ResetLogOptions : MemoryOptions {
     ChangeOptions change;
 };
 
 void ResetLog(Session& session, const ResetLogOptions& options) {
-    MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
+    MemoryTarget target(session, options, MemoryTarget::Use::Change);
     const EepromImage empty = target.Interpret(WithEmptyLog);
-    target.Change(empty, options.change, Granularity::Elements, Json::Object(),
-                  [&session] { session.Out() << "empty log: "; });
+    target.Change(empty, options.change, Granularity::Elements, Json::Object(), "empty log: ");
 }
 
 }  // namespace
@@ -56,13 +48,13 @@ void AddLog(CommandSpec app, Session& session) {
     CommandSpec group = app.AddGroup("log", "show and reset the usage log");
 
     auto [show, showOptions] = NewCommand(group, session, "show", "show the usage log", ShowLog);
-    show.AddFlag("--numbers", showOptions.numbers, "show vectors as numbers, not as plots").Group("Output");
-    AddMemoryOptions(show, showOptions.memory);
+    show.Under("Output").Add("--numbers", showOptions.numbers, "show vectors as numbers, not as plots");
+    AddMemoryOptions(show, showOptions);
 
     auto [reset, resetOptions] =
         NewCommand(group, session, "reset", "empty both copies of the usage log", ResetLog);
     AddChangeOptions(reset, resetOptions.change);
-    AddMemoryOptions(reset, resetOptions.memory);
+    AddMemoryOptions(reset, resetOptions);
 }
 
 }  // namespace Varnholt::Cli

@@ -35,20 +35,13 @@ std::string CheckParameters(const std::string& text) {
 }  // namespace
 
 void AddMeasurementOptions(CommandSpec command, MeasurementOptions& options) {
-    const char* const heading = "Measurement";
-    command
-        .Add("--integration-time", options.integrationTime,
-             "integration time in seconds (default: the fixed 294 time units)")
-        .Type("S")
-        .Between(1e-9, 1e6)
-        .Group(heading);
-    command
-        .Add("--parameters", options.parameters,
-             "the four measurement parameters as they are sent (default: 294,0,1,6)")
-        .Type("P1,P2,P3,P4")
-        .Check(CheckParameters)
-        .Excludes("--integration-time")
-        .Group(heading);
+    CommandSpec measurement = command.Under("Measurement");
+    measurement.Add("--integration-time", options.integrationTime,
+                    "integration time in seconds (default: the fixed 294 time units)",
+                    {.type = "S", .between = {{1e-9, 1e6}}});
+    measurement.Add("--parameters", options.parameters,
+                    "the four measurement parameters as they are sent (default: 294,0,1,6)",
+                    {.type = "P1,P2,P3,P4", .excludes = {"--integration-time"}, .check = CheckParameters});
 }
 
 Service::MeasurementSettings MeasurementOptions::Settings() const {

@@ -8,37 +8,25 @@
 namespace Varnholt::Cli {
 namespace {
 
-struct MonitorOptions {
-    InstrumentOptions instrument;
+struct MonitorOptions : InstrumentOptions {
     double seconds = 0;
-    bool json = false;
 };
 
 constexpr std::uint32_t LookInterval = 20;  // milliseconds
 
 const char* NameOf(Service::EventKind kind) {
-    switch (kind) {
-        case Service::EventKind::Button:
-            return "button";
-        case Service::EventKind::Removed:
-            return "removed";
-        case Service::EventKind::Unknown:
-            break;
-    }
-    return "unknown";
+    static constexpr const char* names[] = {"button", "removed", "unknown"};
+    return names[static_cast<std::size_t>(kind)];
 }
 
 void Print(Session& session, const Service::InstrumentEvent& event, bool asJson) {
-    if (asJson) {
-        session.Print({{"seconds", event.seconds}, {"event", NameOf(event.kind)}, {"code", event.code}});
-    } else {
-        session.Out() << fmt::format("{:9.3f} s  {}\n", event.seconds, NameOf(event.kind));
-    }
+    session.Print(asJson, {{"seconds", event.seconds}, {"event", NameOf(event.kind)}, {"code", event.code}},
+                  fmt::format("{:9.3f} s  {}\n", event.seconds, NameOf(event.kind)));
     session.FlushOut();
 }
 
 void Monitor(Session& session, const MonitorOptions& options) {
-    Service::EventWatch watch(session.Context(), ChooseInstrument(session, options.instrument));
+    Service::EventWatch watch(session.Context(), ChooseInstrument(session, options));
     session.Note("watching " + watch.Identifier() + "; Ctrl-C ends");
     for (;;) {
         while (const auto event = watch.Events().Next()) {
@@ -60,11 +48,9 @@ void AddMonitor(CommandSpec app, Session& session) {
     auto [command, options] = NewCommand(
         app, session, "monitor",
         "print a line each time that the button is pressed, and when the instrument is removed", Monitor);
-    command.Add("--for", options.seconds, "end after this many seconds (default: with Ctrl-C)")
-        .Type("SECONDS")
-        .Between(0.001, 1e6);
-    AddInstrumentOptions(command, options.instrument);
-    AddJsonFlag(command, options.json);
+    command.Add("--for", options.seconds, "end after this many seconds (default: with Ctrl-C)",
+                {.type = "SECONDS", .between = {{0.001, 1e6}}});
+    AddCommonOptions(command, options);
 }
 
 }  // namespace Varnholt::Cli

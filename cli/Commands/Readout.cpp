@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <numeric>
-#include <optional>
 #include <sstream>
 
 #include "Commands/AllCommands.h"
@@ -20,12 +19,11 @@ namespace {
 
 constexpr std::size_t ValuesInARow = 8;
 
-struct ReadoutOptions {
-    InstrumentOptions instrument;
+struct ReadoutOptions : InstrumentOptions {
     MeasurementOptions measurement;
     std::uint32_t repeat = 1;
     double interval = 0;
-    bool json = false, csv = false, plot = false, raw = false, ascii = false;
+    bool csv = false, plot = false, raw = false, ascii = false;
     std::string output;
 };
 
@@ -92,7 +90,7 @@ class Formatter final {
                          {"seconds", readout.seconds},
                          {"values", values},
                          {"time", WallTimeText(readout.raw.time)},
-                         {"parameters", Json::Array{p.p1, p.p2, p.p3, p.p4}},
+                         {"parameters", std::array<unsigned, 4>{p.p1, p.p2, p.p3, p.p4}},
                          {"integrationTime", facts_.integrationTime}})
                 .Text();
         }
@@ -172,7 +170,7 @@ void TakeSeries(Session& session, Service::OpenedInstrument& instrument, const R
 }
 
 void TakeInto(RecordOutput& output, Session& session, const ReadoutOptions& options) {
-    Service::OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options.instrument));
+    auto instrument = OpenInstrument(session, options);
     const Service::MeasurementSettings settings = options.measurement.Settings();
     Formatter formatter(session, options, instrument.Identifier());
     PrepareMeasurement(instrument, settings);
@@ -210,32 +208,21 @@ void TakeReadouts(Session& session, const ReadoutOptions& options) {
 void AddReadout(CommandSpec app, Session& session) {
     auto [command, options] =
         NewCommand(app, session, "readout", "take readouts of 128 values", TakeReadouts);
-    command.Add("-n,--repeat", options.repeat, "readouts to take, 0: until Ctrl-C (default: 1)").Type("N");
-    command.Add("-i,--interval", options.interval, "seconds from one readout to the next")
-        .Type("S")
-        .Between(0.0, 86400.0);
-    const char* const heading = "Output (default: a table)";
-    command.AddFlag("--json", options.json, "print JSON, one line for each readout").Group(heading);
-    command.AddFlag("--csv", options.csv, "print CSV, one line for each readout")
-        .Excludes("--json")
-        .Group(heading);
-    command.AddFlag("--plot", options.plot, "draw the values")
-        .Excludes("--json")
-        .Excludes("--csv")
-        .Group(heading);
-    command.AddFlag("--raw", options.raw, "the 256 bytes of each readout as the instrument sent them")
-        .Excludes("--json")
-        .Excludes("--csv")
-        .Excludes("--plot")
-        .Group(heading);
-    command.AddFlag("--ascii", options.ascii, "draw without Braille characters").Group(heading);
-    command
-        .Add("-o,--output", options.output,
-             "write to a file, which is replaced when complete; -: to standard output")
-        .Type("FILE")
-        .Group(heading);
+    command.Add("-n,--repeat", options.repeat, "readouts to take, 0: until Ctrl-C (default: 1)",
+                {.type = "N"});
+    command.Add("-i,--interval", options.interval, "seconds from one readout to the next",
+                {.type = "S", .between = {{0, 86400}}});
+    CommandSpec output = command.Under("Output (default: a table)");
+    output.Add("--json", options.json, "print JSON, one line for each readout");
+    output.Add("--csv", options.csv, "print CSV, one line for each readout", {.excludes = {"--json"}});
+    output.Add("--plot", options.plot, "draw the values", {.excludes = {"--json", "--csv"}});
+    output.Add("--raw", options.raw, "the 256 bytes of each readout as the instrument sent them",
+               {.excludes = {"--json", "--csv", "--plot"}});
+    output.Add("--ascii", options.ascii, "draw without Braille characters");
+    output.Add("-o,--output", options.output,
+               "write to a file, which is replaced when complete; -: to standard output", {.type = "FILE"});
     AddMeasurementOptions(command, options.measurement);
-    AddInstrumentOptions(command, options.instrument);
+    AddInstrumentOptions(command, options);
 }
 
 }  // namespace Varnholt::Cli

@@ -87,13 +87,9 @@ void Register(Session& session, const RegisterOptions& options) {
                       fmt::format("{} is not registered in {}", options.id, options.file));
     }
     if (options.dryRun) {
-        if (options.json) {
-            session.Print({{"file", options.file}, {"changed", false}, {"content", after}});
-        } else if (after.empty()) {
-            session.Out() << "would remove " << options.file << "\n";
-        } else {
-            session.Out() << "would write " << options.file << ":\n" << after;
-        }
+        session.Print(options.json, {{"file", options.file}, {"changed", false}, {"content", after}},
+                      after.empty() ? fmt::format("would remove {}\n", options.file)
+                                    : fmt::format("would write {}:\n{}", options.file, after));
         return;
     }
     if (geteuid() != 0 && options.file == UdevRuleFile) {
@@ -127,10 +123,10 @@ void AddRegister(CommandSpec app, Session& session) {
     auto [command, options] = NewCommand(
         app, session, "register",
         "make a kind of USB device known as an instrument (writes a udev rule; as root)", Register);
-    command.Add("VID:PID", options.id, "vendor and product number; `ostra list --candidates` shows them")
-        .Required();
-    command.AddFlag("--remove", options.remove, "take the registration back");
-    command.AddFlag("--dry-run", options.dryRun, "show what would be written");
+    command.Add("VID:PID", options.id, "vendor and product number; `ostra list --candidates` shows them",
+                {.isRequired = true});
+    command.Add("--remove", options.remove, "take the registration back");
+    command.Add("--dry-run", options.dryRun, "show what would be written");
     command.Add("--file", options.file, "the file of udev rules; other rules in it stay");
     AddJsonFlag(command, options.json);
 }

@@ -16,15 +16,12 @@ namespace {
 
 constexpr const char* RecordNoun = "record";
 
-struct ScanOptions {
-    InstrumentOptions instrument;
+struct ScanOptions : InstrumentOptions {
     MeasurementOptions measurement;
-    std::uint32_t recordSize = Protocol::ReadoutBytes;
-    std::uint32_t total = 0;
-    std::uint32_t records = 0;
-    std::uint32_t timeout = 5;
-    bool raw = false, json = false, discard = false;
-    bool header = false, number = false, time = false;
+    Service::ScanSettings scan;
+    std::uint32_t records = 0;  ///< 0: as many as the scan's total has
+    bool raw = false, discard = false, header = false;
+    CsvColumns columns;
     std::string output;
 };
 
@@ -35,25 +32,27 @@ struct Ending {
     double seconds = 0;
 };
 
-std::uint32_t TotalOf(const ScanOptions& options, Service::Context::Transport transport) {
+Service::ScanSettings SettingsOf(const ScanOptions& options, Service::Context::Transport transport) {
+    Service::ScanSettings scan = options.scan;
     const std::uint64_t total =
-        options.records > 0 ? std::uint64_t{options.records} * options.recordSize : options.total;
+        options.records > 0 ? std::uint64_t{options.records} * scan.recordSize : scan.total;
     if (total > 0xFFFFFFFF) {
         throw Failure(FailureKind::BadArgument, "a scan holds less than 4 GiB", "fewer --records");
     }
-    if (!options.raw && options.recordSize % 2 != 0) {
+    if (!options.raw && scan.recordSize % 2 != 0) {
         throw Failure(FailureKind::BadArgument, "records of an odd number of bytes hold no 16-bit values",
                       "an even --record-size, or --raw");
     }
     // Its driver drops a last record that is not whole.
-    if (transport == Service::Context::Transport::Native && total % options.recordSize != 0) {
+    if (transport == Service::Context::Transport::Native && total % scan.recordSize != 0) {
         throw Failure(
             FailureKind::BadArgument,
             fmt::format("over the transport native --total is a multiple of --record-size: {} is none of {}",
-                        total, options.recordSize),
+                        total, scan.recordSize),
             "another --total or --record-size, or --transport usbio");
     }
-    return static_cast<std::uint32_t>(total);
+    scan.total = static_cast<std::uint32_t>(total);
+    return scan;
 }
 
 const char* NameOf(ExitCode code) {
@@ -75,7 +74,7 @@ void PrintSummary(Session& session, const ScanOptions& options, const std::strin
                   const RecordOutput& output, const Ending& ending, const std::string& file) {
     session.Print({{"identifier", identifier},
                    {"records", output.Records()},
-                   {"recordSize", options.recordSize},
+                   {"recordSize", options.scan.recordSize},
                    {"bytes", ending.report.received},
                    {"seconds", ending.seconds},
                    {"file", Json::OrNull(file)},
@@ -88,15 +87,15 @@ std::span<const char> CharactersOf(std::span<const std::uint8_t> bytes) {
 
 /// Scans into the output and completes it. `ending` is kept up to date, for whoever catches a failure.
 void ScanInto(RecordOutput& output, Session& session, Service::OpenedInstrument& instrument,
-              const ScanOptions& options, std::uint32_t total, Ending& ending) {
+              const ScanOptions& options, const Service::ScanSettings& scan, Ending& ending) {
     PrepareMeasurement(instrument, options.measurement.Settings());
     Service::ElapsedTime time;
-    RecordCsv csv(options.recordSize, {options.number, options.time});
+    RecordCsv csv(scan.recordSize, options.columns);
     if (options.header) {
         output.Append(csv.Head(), 0);
     }
     const auto write = [&](std::span<const std::uint8_t> records, std::uint64_t milliseconds) {
-        const std::uint64_t count = records.size() / options.recordSize;
+        const std::uint64_t count = records.size() / scan.recordSize;
         if (options.raw) {
             output.Append(CharactersOf(records), count);
         } else {
@@ -105,7 +104,7 @@ void ScanInto(RecordOutput& output, Session& session, Service::OpenedInstrument&
         }
     };
     try {
-        RunScan(instrument, {options.recordSize, total, options.timeout}, write, ending.report);
+        RunScan(instrument, scan, write, ending.report);
     } catch (...) {
         ending.seconds = time.Seconds();
         throw;
@@ -133,17 +132,16 @@ void CheckForm(const ScanOptions& options) {
 }
 
 void Scan(Session& session, const ScanOptions& options) {
-    session.ChooseTransport(options.instrument.transport);
-    const std::uint32_t total = TotalOf(options, session.Context().UsedTransport());
+    session.ChooseTransport(options.transport);
+    const Service::ScanSettings scan = SettingsOf(options, session.Context().UsedTransport());
     CheckForm(options);
     const auto output = MakeRecordOutput(session, options.output, options.raw);
     std::string identifier;
     Ending ending;
     try {
-        Service::OpenedInstrument instrument(session.Context(),
-                                             ChooseInstrument(session, options.instrument));
+        auto instrument = OpenInstrument(session, options);
         identifier = instrument.Identifier();
-        ScanInto(*output, session, instrument, options, total, ending);
+        ScanInto(*output, session, instrument, options, scan, ending);
     } catch (...) {
         const EarlyEnd end = EndEarly(session, *output, RecordNoun, options.discard);
         if (options.json && !identifier.empty()) {
@@ -158,7 +156,7 @@ void Scan(Session& session, const ScanOptions& options) {
         const double rate =
             ending.seconds > 0 ? static_cast<double>(ending.report.received) / ending.seconds : 0;
         session.Note(fmt::format("{} of {} bytes in {:.3f} s{}{}", CountText(output->Records(), RecordNoun),
-                                 options.recordSize, ending.seconds,
+                                 scan.recordSize, ending.seconds,
                                  rate > 0 ? ", " + SizeText(rate) + "/s" : "",
                                  GoesToFile(options.output) ? ", written to " + options.output : ""));
     }
@@ -170,42 +168,31 @@ void AddScan(CommandSpec app, Session& session) {
     auto [command, options] = NewCommand(
         app, session, "scan",
         "stream records: a fixed number of them, or until the instrument stops; Ctrl-C ends it", Scan);
-    command
-        .Add("--total", options.total, "bytes to read; over the transport native a multiple of --record-size")
-        .Type("BYTES")
-        .Between(1, std::numeric_limits<std::uint32_t>::max());
-    command.Add("--records", options.records, "records to read")
-        .Type("N")
-        .Between(1, std::numeric_limits<std::uint32_t>::max())
-        .Excludes("--total");
-    command.Add("--record-size", options.recordSize, "bytes of a record, 1 to 6553 (default: 256)")
-        .Type("BYTES")
-        .Between(1, Service::LongestScanRecord);
-    command.Add("--timeout", options.timeout, "seconds that a transfer may take (default: 5)")
-        .Type("S")
-        .Between(0, 86400);
-    const char* const group = "Output (default: CSV on standard output, one record a line)";
-    command
-        .Add("-o,--output", options.output,
-             "write to a file, which is replaced when complete; -: to standard output")
-        .Type("FILE")
-        .Group(group);
-    command.AddFlag("--discard", options.discard, "keep nothing of a scan that ends early").Group(group);
-    command.AddFlag("--raw", options.raw, "the bytes as the instrument sent them").Group(group);
-    command.AddFlag("--header", options.header, "CSV: begin with the names of the columns")
-        .Excludes("--raw")
-        .Group(group);
-    command.AddFlag("--number", options.number, "CSV: a column with each record's number, from 1")
-        .Excludes("--raw")
-        .Group(group);
-    command
-        .AddFlag("--time", options.time,
-                 "CSV: a column with the seconds from the start until the record's transfer came")
-        .Excludes("--raw")
-        .Group(group);
-    command.AddFlag("--json", options.json, "print a summary as JSON; needs --output").Group(group);
+    constexpr double mostBytes = std::numeric_limits<std::uint32_t>::max();
+    command.Add("--total", options.scan.total,
+                "bytes to read; over the transport native a multiple of --record-size",
+                {.type = "BYTES", .between = {{1, mostBytes}}});
+    command.Add("--records", options.records, "records to read",
+                {.type = "N", .excludes = {"--total"}, .between = {{1, mostBytes}}});
+    command.Add("--record-size", options.scan.recordSize, "bytes of a record, 1 to 6553 (default: 256)",
+                {.type = "BYTES", .between = {{1, Service::LongestScanRecord}}});
+    command.Add("--timeout", options.scan.timeout, "seconds that a transfer may take (default: 5)",
+                {.type = "S", .between = {{0, 86400}}});
+    CommandSpec output = command.Under("Output (default: CSV on standard output, one record a line)");
+    output.Add("-o,--output", options.output,
+               "write to a file, which is replaced when complete; -: to standard output", {.type = "FILE"});
+    output.Add("--discard", options.discard, "keep nothing of a scan that ends early");
+    output.Add("--raw", options.raw, "the bytes as the instrument sent them");
+    output.Add("--header", options.header, "CSV: begin with the names of the columns",
+               {.excludes = {"--raw"}});
+    output.Add("--number", options.columns.number, "CSV: a column with each record's number, from 1",
+               {.excludes = {"--raw"}});
+    output.Add("--time", options.columns.seconds,
+               "CSV: a column with the seconds from the start until the record's transfer came",
+               {.excludes = {"--raw"}});
+    output.Add("--json", options.json, "print a summary as JSON; needs --output");
     AddMeasurementOptions(command, options.measurement);
-    AddInstrumentOptions(command, options.instrument);
+    AddInstrumentOptions(command, options);
 }
 
 }  // namespace Varnholt::Cli

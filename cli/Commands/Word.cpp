@@ -1,10 +1,7 @@
-#include <limits>
+#include <algorithm>
 
 #include "Commands/AllCommands.h"
-#include "Commands/CommonOptions.h"
 #include "Memory/MemoryTarget.h"
-#include "Output/Json.h"
-#include "Output/Rows.h"
 #include "Output/ValueList.h"
 #include "Protocol/PropertyIdentifiers.h"
 #include "Service/Memory/ImageEdit.h"
@@ -15,8 +12,7 @@ namespace {
 
 using namespace Service;
 
-struct GetWordOptions {
-    MemoryOptions memory;
+struct GetWordOptions : MemoryOptions {
     std::vector<std::uint16_t> ids;
 };
 
@@ -27,23 +23,20 @@ void GetWord(Session& session, const GetWordOptions& options) {
             ids.push_back(id);
         }
     }
-    const MemoryTarget target(session, options.memory, MemoryTarget::Use::Read);
+    const MemoryTarget target(session, options, MemoryTarget::Use::Read);
     Json words;
-    Table table({{"ID", Table::Align::Right}, {"WORD"}, {"", Table::Align::Right}});
-    for (const std::uint16_t id : ids) {
-        const std::uint32_t word = RawWordOf(target.Image(), id);
-        words.Add(std::to_string(id), word);
-        table.AddRow({std::to_string(id), CellOfWord(word).text, std::to_string(word)});
+    Rows table({{"ID", nullptr, Rows::Right}, {"WORD"}, {"", nullptr, Rows::Right}});
+    for (auto id = ids.begin(); id != ids.end(); ++id) {
+        const std::uint32_t word = RawWordOf(target.Image(), *id);
+        table.Add({*id, CellOfWord(word), word});
+        if (std::find(ids.begin(), id, *id) == id) {  // the first of its kind
+            words.Add(std::to_string(*id), word);
+        }
     }
-    if (options.memory.json) {
-        session.Print({{"source", target.Name()}, {"words", words}});
-    } else {
-        table.Print(session.Out());
-    }
+    session.Print(options.json, {{"source", target.Name()}, {"words", words}}, table.Text());
 }
 
-struct PutWordOptions {
-    MemoryOptions memory;
+struct PutWordOptions : MemoryOptions {
     ChangeOptions change;
     std::vector<std::string> assignments;
 };
@@ -55,23 +48,22 @@ void PutWord(Session& session, const PutWordOptions& options) {
     };
     std::vector<Word> words;
     for (const Assignment& assignment : ParseAssignments(options.assignments)) {
-        std::uint64_t value = 0;
-        if (!ParseNumber(assignment.value, std::numeric_limits<std::uint32_t>::max(), value)) {
+        const auto value = ParseNumber<std::uint32_t>(assignment.value);
+        if (!value) {
             throw Failure(FailureKind::BadArgument, "'" + assignment.value + "' is no 32-bit number",
                           "for example 10200=0x01020304");
         }
-        words.push_back({assignment.id, static_cast<std::uint32_t>(value)});
+        words.push_back({assignment.id, *value});
     }
-    MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
+    MemoryTarget target(session, options, MemoryTarget::Use::Change);
     EepromImage edited = target.Image();
-    Rows changes({{"ID", "id", Table::Align::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}});
+    Rows changes({{"ID", "id", Rows::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}});
     for (const Word& word : words) {
         const std::uint32_t before = RawWordOf(edited, word.id);
         SetRawWord(edited, word.id, word.value);
         changes.Add({word.id, CellOfWord(before), "->", CellOfWord(word.value)});
     }
-    target.Change(edited, options.change, Granularity::Elements, {{"changes", changes.AsJson()}},
-                  [&] { changes.Print(session.Out()); });
+    target.Change(edited, options.change, changes);
 }
 
 }  // namespace
@@ -81,12 +73,13 @@ void AddWord(CommandSpec app, Session& session) {
 
     auto [get, getOptions] = NewCommand(group, session, "get", "show raw words", GetWord);
     get.Add("ID", getOptions.ids, "10200 to 10239 (default: 10200 to 10215; those behind are the table's)");
-    AddMemoryOptions(get, getOptions.memory);
+    AddMemoryOptions(get, getOptions);
 
     auto [put, putOptions] = NewCommand(group, session, "put", "write raw words", PutWord);
-    put.Add("ID=VALUE", putOptions.assignments, "words 10200 to 10215, decimal or 0x...").Required();
+    put.Add("ID=VALUE", putOptions.assignments, "words 10200 to 10215, decimal or 0x...",
+            {.isRequired = true});
     AddChangeOptions(put, putOptions.change);
-    AddMemoryOptions(put, putOptions.memory);
+    AddMemoryOptions(put, putOptions);
 }
 
 }  // namespace Varnholt::Cli

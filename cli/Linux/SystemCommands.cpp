@@ -67,8 +67,8 @@ void PrintCandidates(Session& session, bool json) {
                {"VID:PID", "id"},
                {"REGISTERED", "registered"},
                {"DEVICE", "device"},
-               {"", "serial", Table::Align::Left, false},
-               {"", "node", Table::Align::Left, false}});
+               {"", "serial", Rows::Hidden},
+               {"", "node", Rows::Hidden}});
     for (const auto& device : Platform::Usb::ListCandidateDevices()) {
         rows.Add({device.name,
                   device.vendorId + ":" + device.productId,
@@ -77,12 +77,10 @@ void PrintCandidates(Session& session, bool json) {
                   device.serial,
                   device.deviceNode});
     }
-    if (json) {
-        session.Print({{"candidates", rows.AsJson()}});
-    } else if (rows.IsEmpty()) {
+    if (!json && rows.IsEmpty()) {
         session.Note("no USB device with the instrument's endpoints is plugged in");
     } else {
-        rows.Print(session.Out());
+        session.Print(json, {{"candidates", rows.AsJson()}}, rows.Text());
     }
 }
 

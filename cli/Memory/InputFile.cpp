@@ -65,6 +65,11 @@ std::vector<std::uint8_t> ReadFileOfSize(Session& session, const std::string& na
     return content;
 }
 
+void AddImageArgument(CommandSpec command, std::string& file) {
+    command.Add("--image,FILE", file, "image of 8192 bytes; `-` is standard input",
+                {.type = "FILE", .isRequired = true});
+}
+
 Service::EepromImage ReadImageFile(Session& session, const std::string& name) {
     return ReadFileOfSize(
         session, name, Protocol::EepromSize, "an EEPROM image",

@@ -4,6 +4,7 @@
 #include <string>
 #include <vector>
 
+#include "CommandSpec.h"
 #include "Service/Memory/EepromImage.h"
 
 namespace Varnholt::Cli {
@@ -23,6 +24,8 @@ class Session;
 std::vector<std::uint8_t> ReadFileOfSize(Session& session, const std::string& name, std::size_t size,
                                          const std::string& what, const std::string& advice = {});
 
+/// FILE, or --image FILE: an image that is read.
+void AddImageArgument(CommandSpec command, std::string& file);
 /// An image, as far as its size tells.
 Service::EepromImage ReadImageFile(Session& session, const std::string& name);
 

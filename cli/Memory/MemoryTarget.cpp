@@ -7,9 +7,7 @@
 #include <numeric>
 #include <ostream>
 
-#include "Commands/CommonOptions.h"
 #include "Memory/InputFile.h"
-#include "Output/Json.h"
 #include "Service/Memory/ImageCheck.h"
 #include "Terminal.h"
 #include "Utilities/Files/AtomicFile.h"
@@ -41,30 +39,25 @@ std::uint32_t CountDifferences(const EepromImage& a, const EepromImage& b) {
 }  // namespace
 
 void AddMemoryOptions(CommandSpec command, MemoryOptions& options, const std::string& argument) {
-    AddInstrumentOptions(command, options.instrument);
+    AddInstrumentOptions(command, options);
     const std::string names = argument.empty() ? "--image" : "--image," + argument;
-    command
+    command.Under("Instrument")
         .Add(names.c_str(), options.imageFile,
-             "work on this image file instead of an instrument; `-` is standard input (and output)")
-        .Type("FILE")
-        .Excludes("--device")
-        .Excludes("--transport")
-        .Group("Instrument");
+             "work on this image file instead of an instrument; `-` is standard input (and output)",
+             {.type = "FILE", .excludes = {"--device", "--transport"}});
     AddJsonFlag(command, options.json);
 }
 
 void AddChangeOptions(CommandSpec command, ChangeOptions& options, BackupHabit habit) {
     const bool isMade = habit == BackupHabit::Always;
-    const char* const group = "Change";
-    command.AddFlag("--dry-run", options.dryRun, "show what would be done and do nothing").Group(group);
-    command
-        .Add("--backup", options.backupFile,
-             isMade ? "file for the instrument's earlier content; must not exist (default: a new name)"
-                    : "file for the instrument's earlier content; must not exist (default: no backup)")
-        .Type("FILE")
-        .Group(group);
+    CommandSpec change = command.Under("Change");
+    change.Add("--dry-run", options.dryRun, "show what would be done and do nothing");
+    change.Add("--backup", options.backupFile,
+               isMade ? "file for the instrument's earlier content; must not exist (default: a new name)"
+                      : "file for the instrument's earlier content; must not exist (default: no backup)",
+               {.type = "FILE"});
     if (isMade) {
-        command.AddFlag("--no-backup", options.noBackup, "make no backup").Excludes("--backup").Group(group);
+        change.Add("--no-backup", options.noBackup, "make no backup", {.excludes = {"--backup"}});
     }
 }
 
@@ -78,9 +71,9 @@ MemoryTarget::MemoryTarget(Session& usedSession, const MemoryOptions& options, U
         image_ = ReadImageFile(session_, file_);
         return;
     }
-    instrument_.emplace(session_.Context(),
-                        ChooseInstrument(session_, options.instrument,
-                                         use == Use::Change ? Choice::MustBeNamed : Choice::FirstWillDo));
+    instrument_.emplace(
+        session_.Context(),
+        ChooseInstrument(session_, options, use == Use::Change ? Choice::MustBeNamed : Choice::FirstWillDo));
     name_ = instrument_->Identifier();
     image_ = ReadEepromTwice(*instrument_);
 }
@@ -145,7 +138,7 @@ MemoryTarget::Outcome MemoryTarget::Make(const EepromImage& wanted, const Change
 }
 
 void MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& options, Granularity granularity,
-                          const Json& details, const std::function<void()>& lead) {
+                          const Json& details, const std::string& lead) {
     const Outcome outcome = Make(wanted, options, granularity);
     if (json_) {
         Json result = {{"target", name_},
@@ -157,7 +150,7 @@ void MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& option
         session_.Print(result);
         return;
     }
-    lead();
+    session_.Out() << lead;
     if (outcome.bytes == 0) {
         session_.Out() << name_ << " holds this already; nothing to write\n";
         return;

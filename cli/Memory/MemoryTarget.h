@@ -1,23 +1,18 @@
 #pragma once
 
-#include <functional>
-#include <memory>
 #include <optional>
 #include <string>
 
 #include "Commands/CommonOptions.h"
-#include "Output/Json.h"
+#include "Output/Rows.h"
 #include "Service/Memory/EepromAccess.h"
-#include "Service/OpenedInstrument.h"
 #include "Utilities/Exceptions/Exceptions.h"
 
 namespace Varnholt::Cli {
 
 /// What a memory command works on: an instrument, or an image file instead.
-struct MemoryOptions {
-    InstrumentOptions instrument;
+struct MemoryOptions : InstrumentOptions {
     std::string imageFile;
-    bool json = false;
 };
 
 /// How a memory command changes it.
@@ -61,11 +56,15 @@ class MemoryTarget final {
     }
 
     /// Makes the content `wanted` and tells the user: as JSON, with the members of `details`, or in a line
-    /// behind what `lead` prints. A file is replaced as a whole. Of an instrument a backup is made, only what
-    /// differs is written, and all is read back.
-    void Change(
-        const Service::EepromImage& wanted, const ChangeOptions& options, Service::Granularity granularity,
-        const Json& details, const std::function<void()>& lead = [] {});
+    /// behind `lead`. A file is replaced as a whole. Of an instrument a backup is made, only what differs is
+    /// written, and all is read back.
+    void Change(const Service::EepromImage& wanted, const ChangeOptions& options,
+                Service::Granularity granularity, const Json& details, const std::string& lead = {});
+    /// The same for a change of values, which the rows are.
+    void Change(const Service::EepromImage& wanted, const ChangeOptions& options, const Rows& changes) {
+        Change(wanted, options, Service::Granularity::Elements, {{"changes", changes.AsJson()}},
+               changes.Text());
+    }
 
   private:
     /// What a change did, or with a dry run would have done.

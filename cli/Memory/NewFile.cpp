@@ -11,8 +11,9 @@ namespace Varnholt::Cli {
 using Utilities::Files::AtomicFile;
 
 void AddNewFileOptions(CommandSpec command, const char* names, NewFileOptions& options) {
-    command.Add(names, options.name, "must not exist; `-` is standard output").Type("FILE").Required();
-    command.AddFlag("--force", options.force, "replace a file that exists").Group("Output");
+    command.Add(names, options.name, "must not exist; `-` is standard output",
+                {.type = "FILE", .isRequired = true});
+    command.Under("Output").Add("--force", options.force, "replace a file that exists");
 }
 
 NewFile::NewFile(Session& usedSession, const NewFileOptions& chosen)

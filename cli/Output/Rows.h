@@ -3,7 +3,6 @@
 #include <optional>
 
 #include "Output/Json.h"
-#include "Output/Table.h"
 
 namespace Varnholt::Cli {
 
@@ -11,11 +10,12 @@ namespace Varnholt::Cli {
 /// row.
 class Rows final {
   public:
+    /// Numbers stand at the right of their column, and everything else at the left.
+    enum Align { Left, Right, Hidden };
     struct Column {
-        std::string title;             ///< of the table
+        std::string title;             ///< a table whose titles are all empty has no head
         const char* member = nullptr;  ///< of the objects; null: the column is in the table only
-        Table::Align align = Table::Align::Left;
-        bool isShown = true;  ///< in the table
+        Align align = Left;            ///< `Hidden`: it is in the objects only
     };
     /// What stands in both; another value, or none, may stand in the object.
     struct Cell {
@@ -30,17 +30,19 @@ class Rows final {
         std::optional<Json> value;
     };
 
-    explicit Rows(std::vector<Column> rowColumns);
+    explicit Rows(std::vector<Column> rowColumns) : columns_(std::move(rowColumns)) {}
 
-    void Add(const std::vector<Cell>& cells);
-    bool IsEmpty() const { return table_.IsEmpty(); }
-    void Print(std::ostream& stream) const { table_.Print(stream); }
+    /// Missing cells are empty, and in no object.
+    void Add(std::vector<Cell> cells);
+    bool IsEmpty() const { return rows_.empty(); }
+    /// The table: each column as wide as its widest cell, and no line that ends with blanks.
+    std::string Text() const;
     const Json& AsJson() const { return array_; }
 
   private:
     const std::vector<Column> columns_;
-    Table table_;
-    Json array_{Json::Array()};
+    std::vector<std::vector<std::string>> rows_;
+    Json array_ = Json::Array();
 };
 
 }  // namespace Varnholt::Cli

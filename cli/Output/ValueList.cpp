@@ -38,13 +38,12 @@ Rows::Cell CellOfWord(std::uint32_t word) {
 }
 
 void PrintValues(Session& session, const Properties& values, Vectors vectors) {
-    Table table({{"ID", Table::Align::Right}, {"VALUE"}});
+    Rows table({{"ID", nullptr, Rows::Right}, {"VALUE"}});
     for (const auto& [id, value] : values.GetDatastore()) {
-        table.AddRow({std::to_string(id), IsLongVector(value)
-                                              ? fmt::format("{} elements, below", NumbersOf(value).size())
-                                              : TextOf(value)});
+        table.Add({id, IsLongVector(value) ? fmt::format("{} elements, below", NumbersOf(value).size())
+                                           : TextOf(value)});
     }
-    table.Print(session.Out());
+    session.Out() << table.Text();
     for (const auto& [id, value] : values.GetDatastore()) {
         if (!IsLongVector(value)) {
             continue;

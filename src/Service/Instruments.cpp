@@ -3,10 +3,10 @@
 #include <fmt/format.h>
 
 #include <algorithm>
-#include <cctype>
 #include <string_view>
 
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
+#include "Service/Number.h"
 #include "Service/OpenedInstrument.h"
 #include "Service/SystemAdvice.h"
 
@@ -19,18 +19,11 @@ constexpr std::string_view ChipPrefix = "chip:";
 constexpr std::size_t ChipDigits = 16;
 constexpr const char* ShowChips = "`ostra list --chip-id` shows the chip ids";
 
-std::string LowerCase(std::string text) {
-    std::ranges::transform(text, text.begin(),
-                           [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
-    return text;
-}
-
 /// They are asked one after the other, up to the one that fits.
 std::string FindByChipId(Context& context, const std::vector<std::string>& identifiers,
                          const std::string& name) {
-    const std::string wanted = LowerCase(name.substr(ChipPrefix.size()));
-    if (wanted.size() != ChipDigits ||
-        !std::ranges::all_of(wanted, [](unsigned char c) { return std::isxdigit(c) != 0; })) {
+    const auto wanted = ParseHexadecimal(name.substr(ChipPrefix.size()), ChipDigits);
+    if (!wanted) {
         throw Failure(FailureKind::BadArgument,
                       "'" + name + "' names no chip: an id has 16 hexadecimal digits", ShowChips);
     }

@@ -18,7 +18,7 @@
 #include "Output/Plot.h"
 #include "Output/ProgressLine.h"
 #include "Output/RecordingFile.h"
-#include "Output/Table.h"
+#include "Output/Rows.h"
 #include "Output/WallTimeText.h"
 #include "Service/Failure.h"
 #include "Support/Bytes.h"
@@ -34,14 +34,12 @@ using namespace Cli;
 using Service::Interruption;
 using namespace Varnholt::Utilities::Files;
 
-TEST(TableTest, ColumnsAreAsWideAsTheirWidestCellAndLinesEndWithoutBlanks) {
-    Table table({{"NAME"}, {"VALUE", Table::Align::Right}, {"NOTE"}});
-    table.AddRow({"a", "1", ""});
-    table.AddRow({"longer", "12345678", "x"});
-    table.AddRow({"é"});
-    std::ostringstream out;
-    table.Print(out);
-    EXPECT_EQ(out.str(),
+TEST(RowsTest, ColumnsAreAsWideAsTheirWidestCellAndLinesEndWithoutBlanks) {
+    Rows rows({{"NAME"}, {"VALUE", "value", Rows::Right}, {"", "long", Rows::Hidden}, {"NOTE"}});
+    rows.Add({"a", 1, "not in the table", ""});
+    rows.Add({"longer", 12345678, "", "x"});
+    rows.Add({"é"});
+    EXPECT_EQ(rows.Text(),
               "NAME       VALUE  NOTE\n"
               "a              1\n"
               "longer  12345678  x\n"

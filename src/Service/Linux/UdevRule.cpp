@@ -3,12 +3,12 @@
 #include <fmt/format.h>
 
 #include <algorithm>
-#include <cctype>
 #include <sstream>
 #include <string_view>
 
 #include "Platform/Usb/UdevBus.h"
 #include "Service/Failure.h"
+#include "Service/Number.h"
 
 namespace Varnholt::Service {
 namespace {
@@ -50,24 +50,14 @@ bool IsRuleFor(const UsbId& id, const std::string& line) {
 
 UsbId ParseUsbId(const std::string& text) {
     constexpr std::size_t digits = 4;
-    const auto isNumber = [](std::string_view part) {
-        return part.size() == digits &&
-               std::ranges::all_of(part, [](unsigned char c) { return std::isxdigit(c) != 0; });
-    };
-    const std::string_view vendor = std::string_view(text).substr(0, digits);
-    const std::string_view product = std::string_view(text).substr(std::min(digits + 1, text.size()));
-    if (text.find(':') != digits || !isNumber(vendor) || !isNumber(product)) {
+    const auto vendor = ParseHexadecimal(text.substr(0, digits), digits);
+    const auto product = ParseHexadecimal(text.substr(std::min(digits + 1, text.size())), digits);
+    if (text.find(':') != digits || !vendor || !product) {
         throw Failure(FailureKind::BadArgument, fmt::format("'{}' is no vendor and product number", text),
                       "give them as four hexadecimal digits each, such as 1209:0001; "
                       "`ostra list --candidates` shows those of the devices that could be instruments");
     }
-    const auto lower = [](std::string_view part) {
-        std::string number(part);
-        std::ranges::transform(number, number.begin(),
-                               [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
-        return number;
-    };
-    return {lower(vendor), lower(product)};
+    return {*vendor, *product};
 }
 
 std::string WithRule(const std::string& rules, const UsbId& id) {

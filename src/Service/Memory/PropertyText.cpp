@@ -57,15 +57,15 @@ float ParseFloat(const Assignment& assignment, const std::string& part) {
 std::int32_t ParseLong(const Assignment& assignment, const std::string& part) {
     const bool isNegative = part.starts_with('-');
     constexpr std::uint64_t most = std::numeric_limits<std::int32_t>::max();
-    std::uint64_t number = 0;
     // Hexadecimal numbers name a bit pattern and may have the top bit set.
     const std::uint64_t limit = isNegative               ? most + 1
                                 : part.starts_with("0x") ? std::numeric_limits<std::uint32_t>::max()
                                                          : most;
-    if (!ParseNumber(isNegative ? part.substr(1) : part, limit, number)) {
+    const auto number = ParseNumber(isNegative ? part.substr(1) : part, limit);
+    if (!number) {
         Refuse(assignment, part, "32-bit integer");
     }
-    const auto bits = static_cast<std::uint32_t>(number);
+    const auto bits = static_cast<std::uint32_t>(*number);
     return static_cast<std::int32_t>(isNegative ? 0U - bits : bits);
 }
 
@@ -92,13 +92,12 @@ bool IsLongVector(const Property& value) {
 
 Assignment ParseAssignment(const std::string& text) {
     const std::size_t equals = text.find('=');
-    std::uint64_t id = 0;
-    if (equals == std::string::npos || equals + 1 == text.size() ||
-        !ParseNumber(text.substr(0, equals), std::numeric_limits<std::uint16_t>::max(), id)) {
+    const auto id = ParseNumber<std::uint16_t>(text.substr(0, equals));
+    if (equals == std::string::npos || equals + 1 == text.size() || !id) {
         throw Failure(FailureKind::BadArgument, "'" + text + "' is no ID=VALUE",
                       "for example 1211=5, or 1000=0.5,1.5 for a value of two elements");
     }
-    return {static_cast<std::uint16_t>(id), text.substr(equals + 1)};
+    return {*id, text.substr(equals + 1)};
 }
 
 std::vector<Assignment> ParseAssignments(const std::vector<std::string>& texts) {

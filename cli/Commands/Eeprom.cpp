@@ -1,12 +1,9 @@
 #include <fmt/format.h>
 
 #include "Commands/AllCommands.h"
-#include "Commands/CommonOptions.h"
-#include "Commands/Eeprom.h"
 #include "Memory/InputFile.h"
 #include "Memory/MemoryTarget.h"
 #include "Memory/NewFile.h"
-#include "Output/Json.h"
 #include "Service/Memory/ImageCheck.h"
 #include "Service/Memory/ImageModel.h"
 
@@ -15,15 +12,13 @@ namespace {
 
 using namespace Service;
 
-struct BackupOptions {
-    MemoryOptions memory;
+struct BackupOptions : InstrumentOptions {
     NewFileOptions file;
 };
 
 void Backup(Session& session, const BackupOptions& options) {
     const NewFile file(session, options.file);
-    Service::OpenedInstrument instrument(session.Context(),
-                                         ChooseInstrument(session, options.memory.instrument));
+    auto instrument = OpenInstrument(session, options);
     const EepromImage image = ReadEepromTwice(instrument);
     file.Write(image);
     const bool isSane = IsSane(CheckImage(image));
@@ -31,19 +26,16 @@ void Backup(Session& session, const BackupOptions& options) {
         session.Warn("the EEPROM holds what the driver cannot use; `ostra eeprom check " +
                      QuotedSource(options.file.name) + "` says what");
     }
-    if (options.memory.json) {
-        session.Print({{"identifier", instrument.Identifier()},
-                       {"file", options.file.name},
-                       {"bytes", image.size()},
-                       {"sane", isSane}});
-    } else {
-        session.Out() << instrument.Identifier() << ": " << image.size() << " bytes written to "
-                      << file.ShownName() << '\n';
-    }
+    session.Print(
+        options.json,
+        {{"identifier", instrument.Identifier()},
+         {"file", options.file.name},
+         {"bytes", image.size()},
+         {"sane", isSane}},
+        fmt::format("{}: {} bytes written to {}\n", instrument.Identifier(), image.size(), file.ShownName()));
 }
 
-struct WriteOptions {
-    MemoryOptions memory;
+struct WriteOptions : MemoryOptions {
     ChangeOptions change;
     std::string file;
     bool force = false;
@@ -66,7 +58,7 @@ void CheckBeforeWriting(Session& session, const WriteOptions& options, const Eep
 void Write(Session& session, const WriteOptions& options) {
     const EepromImage image = ReadImageFile(session, options.file);
     CheckBeforeWriting(session, options, image);
-    MemoryTarget target(session, options.memory, MemoryTarget::Use::Change);
+    MemoryTarget target(session, options, MemoryTarget::Use::Change);
     target.Change(image, options.change, Granularity::Pieces, {{"file", options.file}});
 }
 
@@ -81,31 +73,27 @@ void New(Session& session, const BackupOptions& options) {
     const EepromImage image = FreshImage();
     const NewFile file(session, options.file);
     file.Write(image);
-    if (options.memory.json) {
-        session.Print({{"file", options.file.name}, {"bytes", image.size()}});
-    } else {
-        session.Out() << "the image of a fresh instrument written to " << file.ShownName() << '\n';
-    }
+    session.Print(options.json, {{"file", options.file.name}, {"bytes", image.size()}},
+                  fmt::format("the image of a fresh instrument written to {}\n", file.ShownName()));
 }
 
 void AddWriteOptions(CommandSpec command, WriteOptions& options, BackupHabit habit) {
-    command.Add("--image,FILE", options.file, "image of 8192 bytes; `-` is standard input")
-        .Type("FILE")
-        .Required();
-    command.AddFlag("--force", options.force, "write an image that the driver cannot use").Group("Change");
+    AddImageArgument(command, options.file);
+    command.Under("Change").Add("--force", options.force, "write an image that the driver cannot use");
     AddChangeOptions(command, options.change, habit);
-    AddInstrumentOptions(command, options.memory.instrument);
-    AddJsonFlag(command, options.memory.json);
+    AddCommonOptions(command, options);
 }
 
 }  // namespace
 
-void AddEepromTransfers(CommandSpec group, Session& session) {
+void AddEeprom(CommandSpec app, Session& session) {
+    CommandSpec group =
+        app.AddGroup("eeprom", "back up, write, restore, show, check and compare EEPROM images");
+
     auto [backup, backupOptions] =
         NewCommand(group, session, "backup", "save the EEPROM of an instrument in a file", Backup);
     AddNewFileOptions(backup, "--image,FILE", backupOptions.file);
-    AddInstrumentOptions(backup, backupOptions.memory.instrument);
-    AddJsonFlag(backup, backupOptions.memory.json);
+    AddCommonOptions(backup, backupOptions);
 
     auto [write, writeOptions] = NewCommand(
         group, session, "write",
@@ -119,13 +107,8 @@ void AddEepromTransfers(CommandSpec group, Session& session) {
     auto [fresh, freshOptions] =
         NewCommand(group, session, "new", "make the image of a fresh instrument", New);
     AddNewFileOptions(fresh, "--image,FILE", freshOptions.file);
-    AddJsonFlag(fresh, freshOptions.memory.json);
-}
+    AddJsonFlag(fresh, freshOptions.json);
 
-void AddEeprom(CommandSpec app, Session& session) {
-    CommandSpec group =
-        app.AddGroup("eeprom", "back up, write, restore, show, check and compare EEPROM images");
-    AddEepromTransfers(group, session);
     AddEepromViews(group, session);
 }
 
