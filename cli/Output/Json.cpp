@@ -5,99 +5,74 @@
 #include <charconv>
 #include <cmath>
 #include <nlohmann/json.hpp>
-#include <type_traits>
 
 namespace Varnholt::Cli {
+namespace {
 
 using DeviceDriver::Generic::Configuration::Properties;
 using DeviceDriver::Generic::Configuration::Property;
-using DeviceDriver::Generic::Configuration::TypeFloat;
-using DeviceDriver::Generic::Configuration::TypeFloatVector;
 
 /// The package's headers cost every source that includes them seconds: it is seen by this one only.
-class JsonPrinter final {
-  public:
-    using Package = nlohmann::ordered_json;
+std::string Dumped(const nlohmann::json& value) {
+    return value.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
+}
 
-    static Package Convert(const Json& json) {
-        return std::visit([](const auto& value) { return Convert(value); }, json.value_);
-    }
+template <class Number>
+Json JsonOf(const std::vector<Number>& elements) {
+    return elements.size() == 1 ? Json(elements.front()) : Json(elements);
+}
 
-  private:
-    static Package Convert(std::monostate) { return nullptr; }
-    static Package Convert(const Json::Array& elements) {
-        Package array = Package::array();
-        for (const Json& element : elements) {
-            array.push_back(Convert(element));
-        }
-        return array;
-    }
-    static Package Convert(const Json::Object& members) {
-        Package object = Package::object();
-        for (const auto& [name, value] : members) {
-            object[name] = Convert(value);
-        }
-        return object;
-    }
-    template <class Scalar>
-    static Package Convert(const Scalar& value) {
-        return value;
-    }
-};
+}  // namespace
+
+Json::Json(double number) : text_(Dumped(number)) {}
 
 Json::Json(float number) {
     if (std::isfinite(number)) {
         const std::string text = fmt::format("{}", number);
         double shortest = 0;
         std::from_chars(text.data(), text.data() + text.size(), shortest);
-        value_ = shortest;
+        text_ = Dumped(shortest);
     }
 }
 
-Json::Json(std::initializer_list<Member> members) : value_(Object(members)) {}
-Json::Json(Array elements) : value_(std::move(elements)) {}
-Json::Json(Object members) : value_(std::move(members)) {}
+Json::Json(const std::string& text) : text_(Dumped(text)) {}
 
-Json::Json(const Property& value) {
-    const bool isFloat = value.GetType() == TypeFloat || value.GetType() == TypeFloatVector;
-    const Json elements = isFloat ? Json(value.AsFloatVector()) : Json(value.AsLongVector());
-    const auto& array = std::get<Array>(elements.value_);
-    *this = array.size() == 1 ? array.front() : elements;
+Json::Json(std::initializer_list<Member> members) : text_(EmptyObject) {
+    for (const auto& [name, value] : members) {
+        Add(name, value);
+    }
 }
 
-Json::Json(const Properties& values) : value_(Object()) {
+Json::Json(const Property& value)
+    : Json(value.AsLongVector().empty() ? JsonOf(value.AsFloatVector()) : JsonOf(value.AsLongVector())) {}
+
+Json::Json(const Properties& values) : text_(EmptyObject) {
     for (const auto& [id, value] : values.GetDatastore()) {
         Add(std::to_string(id), value);
     }
 }
 
-Json Json::OrNull(const std::string& text) {
-    return text.empty() ? Json() : Json(text);
+/// In front of the bracket that closes this value, which is `empty` if it was null.
+void Json::Insert(const std::string& element, const char* empty) {
+    if (text_ == Null) {
+        text_ = empty;
+    }
+    const std::string comma = text_ == empty ? "" : ",";
+    text_.insert(text_.size() - 1, comma + element);
 }
 
-void Json::Add(std::string name, Json value) {
-    if (value_.index() == 0) {
-        value_ = Object();
-    }
-    std::get<Object>(value_).emplace_back(std::move(name), std::move(value));
+void Json::Add(const std::string& name, const Json& value) {
+    Insert(Dumped(name) + ":" + value.text_, EmptyObject);
 }
 
-void Json::Append(Json element) {
-    if (value_.index() == 0) {
-        value_ = Array();
-    }
-    std::get<Array>(value_).push_back(std::move(element));
+void Json::Append(const Json& element) {
+    Insert(element.text_, EmptyArray);
 }
 
 void Json::AddAll(const Json& object) {
-    for (const auto& [name, value] : std::get<Object>(object.value_)) {
-        Add(name, value);
+    if (object.text_ != EmptyObject) {
+        Insert(object.text_.substr(1, object.text_.size() - 2), EmptyObject);
     }
-}
-
-std::string Json::Text() const {
-    return JsonPrinter::Convert(*this).dump(-1, ' ', false, JsonPrinter::Package::error_handler_t::replace) +
-           '\n';
 }
 
 }  // namespace Varnholt::Cli
