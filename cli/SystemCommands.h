@@ -4,7 +4,6 @@
 #include <string>
 
 #include "CommandSpec.h"
-#include "ExitCode.h"
 
 namespace Varnholt::Cli {
 

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <filesystem>
-#include <optional>
 
 #include "Output/OutputDescriptor.h"
 #include "Output/RecordOutput.h"

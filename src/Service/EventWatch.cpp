@@ -1,6 +1,5 @@
 #include "Service/EventWatch.h"
 
-#include <algorithm>
 #include <mutex>
 
 namespace Varnholt::Service {

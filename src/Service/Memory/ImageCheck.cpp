@@ -327,17 +327,8 @@ std::string ErrorsOf(const std::vector<ImageFinding>& findings) {
 }
 
 const char* NameOf(ImageFinding::Severity severity) {
-    switch (severity) {
-        case Severity::Fine:
-            return "ok";
-        case Severity::Note:
-            return "note";
-        case Severity::Warning:
-            return "warning";
-        case Severity::Error:
-            break;
-    }
-    return "error";
+    static constexpr const char* names[] = {"ok", "note", "warning", "error"};
+    return names[static_cast<std::size_t>(severity)];
 }
 
 }  // namespace Varnholt::Service

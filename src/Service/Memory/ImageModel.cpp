@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <utility>
 
-#include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEAT.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoLog.h"
 #include "DeviceDriver/Ostra/LowLevel/SectionReader.h"

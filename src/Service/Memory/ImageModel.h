@@ -1,7 +1,6 @@
 #pragma once
 
 #include <memory>
-#include <optional>
 
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
 #include "Service/Memory/EepromImage.h"

@@ -4,7 +4,6 @@
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Protocol/ByteOrder.h"
-#include "Utilities/Exceptions/Location.h"
 
 namespace Varnholt::Service {
 
