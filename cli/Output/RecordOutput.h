@@ -3,7 +3,8 @@
 #include <cstdint>
 #include <span>
 #include <string>
-#include <system_error>
+
+#include "Output/OutputDescriptor.h"
 
 namespace Varnholt::Cli {
 
@@ -39,11 +40,7 @@ class RecordOutput {
     virtual void Discard() = 0;
 
   protected:
-    struct Taken {
-        std::size_t bytes;  ///< from the front
-        std::error_code error;
-    };
-    virtual Taken Take(std::span<const char> block) = 0;
+    virtual OutputDescriptor::Outcome Take(std::span<const char> block) = 0;
     [[noreturn]] virtual void Fail(std::error_code error) const = 0;
 
     /// Up to the end of the last whole record.

@@ -54,9 +54,8 @@ RecordingFile::~RecordingFile() {
     }
 }
 
-RecordOutput::Taken RecordingFile::Take(std::span<const char> block) {
-    const OutputDescriptor::Outcome outcome = descriptor_.Write(block, interruption_);
-    return {outcome.accepted, outcome.error};
+OutputDescriptor::Outcome RecordingFile::Take(std::span<const char> block) {
+    return descriptor_.Write(block, interruption_);
 }
 
 void RecordingFile::Complete() {

@@ -2,7 +2,6 @@
 
 #include <filesystem>
 
-#include "Output/OutputDescriptor.h"
 #include "Output/RecordOutput.h"
 #include "Utilities/Files/FinalName.h"
 
@@ -24,7 +23,7 @@ class RecordingFile final : public RecordOutput {
     void Discard() override;
 
   private:
-    Taken Take(std::span<const char> block) override;
+    OutputDescriptor::Outcome Take(std::span<const char> block) override;
     [[noreturn]] void Fail(std::error_code error) const override;
     OutputDescriptor Open();
 

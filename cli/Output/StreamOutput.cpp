@@ -8,9 +8,9 @@
 namespace Varnholt::Cli {
 
 /// Past the stream to its buffer, which answers how much it took.
-RecordOutput::Taken StreamOutput::Take(std::span<const char> block) {
+OutputDescriptor::Outcome StreamOutput::Take(std::span<const char> block) {
     const auto failed = [](std::size_t taken) {
-        return Taken{taken, {errno != 0 ? errno : EIO, std::generic_category()}};
+        return OutputDescriptor::Outcome{taken, {errno != 0 ? errno : EIO, std::generic_category()}};
     };
     errno = 0;
     if (!stream_.flush()) {
@@ -22,7 +22,7 @@ RecordOutput::Taken StreamOutput::Take(std::span<const char> block) {
         stream_.setstate(std::ios::badbit);
         return failed(taken);
     }
-    return stream_.flush() ? Taken{taken, {}} : failed(0);
+    return stream_.flush() ? OutputDescriptor::Outcome{taken, {}} : failed(0);
 }
 
 void StreamOutput::Fail(std::error_code error) const {

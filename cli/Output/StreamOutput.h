@@ -17,7 +17,7 @@ class StreamOutput final : public RecordOutput {
     void Discard() override {}
 
   private:
-    Taken Take(std::span<const char> block) override;
+    OutputDescriptor::Outcome Take(std::span<const char> block) override;
     [[noreturn]] void Fail(std::error_code error) const override;
 
     std::ostream& stream_;
