@@ -40,25 +40,20 @@ double EventReader::SecondsOf(std::uint64_t milliseconds) const {
     return static_cast<double>(milliseconds - start_) / 1000;
 }
 
-std::optional<EventReader::Message> EventReader::Take() {
-    const std::lock_guard holder(mailbox_.section_);
-    if (waiting_.empty()) {
-        return std::nullopt;
-    }
-    const Message first = waiting_.front();
-    waiting_.pop_front();
-    return first;
-}
-
 std::optional<InstrumentEvent> EventReader::Next() {
-    const auto message = Take();
-    if (!message) {
-        return std::nullopt;
+    InstrumentEvent event{EventKind::Unknown, 0, 0};
+    {
+        const std::lock_guard holder(mailbox_.section_);
+        if (waiting_.empty()) {
+            return std::nullopt;
+        }
+        event.code = waiting_.front().code;
+        event.seconds = SecondsOf(waiting_.front().milliseconds);
+        waiting_.pop_front();
     }
-    InstrumentEvent event{EventKind::Unknown, message->code, SecondsOf(message->milliseconds)};
-    if (message->code == DeviceDriver::Generic::MessageButtonData) {
+    if (event.code == DeviceDriver::Generic::MessageButtonData) {
         event.kind = EventKind::Button;
-    } else if (message->code == DeviceDriver::Generic::MessageDeviceGone) {
+    } else if (event.code == DeviceDriver::Generic::MessageDeviceGone) {
         if (!IsRemoved()) {
             throw Failure(FailureKind::TransferFailed, "its events could not be read any more",
                           "it is still connected: watch it again")

@@ -59,7 +59,6 @@ class EventReader final {
         std::uint64_t milliseconds;  ///< on the mailbox's clock
     };
 
-    std::optional<Message> Take();
     double SecondsOf(std::uint64_t milliseconds) const;
     bool IsRemoved() const;
 

@@ -100,14 +100,11 @@ void PellandoFunctionality_PC::ReadStrip(std::uint32_t recordSize, std::uint32_t
                                          std::uint32_t total) {
     // A strip read must have its next read queued in time: its thread goes before others while it runs.
     const Platform::ScopedThreadPriority raised(Platform::HighestThreadPriority);
-    if (ScanReceiver* const receiver = Receiver()) {
-        total != 0 ? device_->ReadDataCountedStrip(*receiver, recordSize, timeout, total)
-                   : device_->ReadDataStrip(*receiver, recordSize, timeout);
-    } else if (total != 0) {
-        device_->ReadDataCountedStrip(scanRecords_, recordSize, timeout, total);
-    } else {
-        device_->ReadDataStrip(scanRecords_, recordSize, timeout);
-    }
+    const auto readInto = [&](auto& target) {
+        total != 0 ? device_->ReadDataCountedStrip(target, recordSize, timeout, total)
+                   : device_->ReadDataStrip(target, recordSize, timeout);
+    };
+    Receiver() != nullptr ? readInto(*Receiver()) : readInto(scanRecords_);
 }
 
 void PellandoFunctionality_PC::GetScanData(std::uint8_t* buffer, std::uint32_t* size) try {
