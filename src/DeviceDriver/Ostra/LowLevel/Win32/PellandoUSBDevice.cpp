@@ -240,7 +240,10 @@ void PellandoUSBDevice::ReadStrip(ScanReceiver& receiver, PartialData partialDat
     const ScopedLock held(core_->lock);
     const std::uint32_t chunk = ChunkSize(recordSize);
     const std::uint32_t limit = WaitLimit(timeout, ScanGrace);
-    const std::string failed = std::string(total ? "system busy. try again. " : "") + "Read data failed (";
+    const auto failed = [&](const char* what, const std::string& counts) {
+        return (total ? "system busy. try again. Read data failed (" : "Read data failed (") +
+               (what + (total ? counts : "")) + ")";
+    };
     StripReader reader(core_->read, chunk);
     std::uint32_t remaining = total.value_or(0);
     const auto start = [&](std::uint32_t wanted) {
@@ -262,11 +265,8 @@ void PellandoUSBDevice::ReadStrip(ScanReceiver& receiver, PartialData partialDat
             return;
         }
         if (reader.Await(limit) == WaitResult::Abandoned) {
-            throw TimeoutException(failed + "Abandoned" +
-                                       (total ? " - remaining: " + std::to_string(remaining) +
-                                                    " total: " + std::to_string(*total)
-                                              : "") +
-                                       ")",
+            throw TimeoutException(failed("Abandoned", " - remaining: " + std::to_string(remaining) +
+                                                           " total: " + std::to_string(total.value_or(0))),
                                    Here());
         }
         if (isFirst && !total) {
@@ -275,17 +275,16 @@ void PellandoUSBDevice::ReadStrip(ScanReceiver& receiver, PartialData partialDat
         const std::uint32_t count = reader.Count();
         const bool fits = total ? count == current : count % recordSize == 0 && count <= current;
         if (!reader.HasSucceeded() || !fits) {
-            const std::string counts = total ? " - read: " + std::to_string(count) +
-                                                   ", expected: " + std::to_string(current) +
-                                                   ", remaining: " + std::to_string(remaining) + ")"
-                                             : ")";
+            const std::string counts = " - read: " + std::to_string(count) +
+                                       ", expected: " + std::to_string(current) +
+                                       ", remaining: " + std::to_string(remaining);
             if (partialData == PartialData::Received) {
                 receiver.Receive(reader.EndAndTake());
             }
             if (!reader.HasSucceeded()) {
-                throw IOException(failed + "OverlappedRead" + counts, Here(), reader.FailureCode());
+                throw IOException(failed("OverlappedRead", counts), Here(), reader.FailureCode());
             }
-            const std::string text = failed + "wrong data size" + counts;
+            const std::string text = failed("wrong data size", counts);
             throw total ? IOException(text, Here(), Shortfall{count, current}) : IOException(text, Here());
         }
         reader.Advance();
