@@ -4,6 +4,7 @@
 #include <limits>
 #include <utility>
 
+#include "Platform/LookUp.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/Instrument.h"
 #include "Protocol/NativeDriver.h"
@@ -92,19 +93,12 @@ Decision NativeDriverFile::AbortPipe(std::uint16_t endpoint) const {
 }
 
 ErrorCode NativeDriverFile::OutcomeOf(Usb::TransferStatus status) const {
-    switch (status) {
-        case Usb::TransferStatus::Completed:
-            return Errors::Success;
-        case Usb::TransferStatus::Cancelled:
-            return Errors::OperationAborted;
-        case Usb::TransferStatus::DeviceGone:
-            return Errors::DeviceNotConnected;
-        case Usb::TransferStatus::Stalled:
-        case Usb::TransferStatus::IoError:
-        case Usb::TransferStatus::Overflow:
-            break;
-    }
-    return Errors::GeneralFailure;
+    static constexpr std::pair<Usb::TransferStatus, ErrorCode> outcomes[] = {
+        {Usb::TransferStatus::Completed, Errors::Success},
+        {Usb::TransferStatus::Cancelled, Errors::OperationAborted},
+        {Usb::TransferStatus::DeviceGone, Errors::DeviceNotConnected},
+    };
+    return LookUp(outcomes, status, Errors::GeneralFailure);
 }
 
 }  // namespace Varnholt::Platform::Drivers

@@ -4,6 +4,7 @@
 #include <mutex>
 #include <utility>
 
+#include "Platform/LookUp.h"
 #include "Protocol/ByteOrder.h"
 
 namespace Varnholt::Platform::Drivers {
@@ -12,23 +13,16 @@ namespace Block = Protocol::UsbIoDriver::ConfigurationBlock;
 namespace Status = Protocol::UsbIoDriver::Status;
 
 ErrorCode UsbIoRefusalOf(ErrorCode usbCode) {
-    switch (usbCode) {
-        case Errors::Success:
-            return Status::Success;
-        case Errors::AccessDenied:
-            return Errors::AccessDenied;
-        case Errors::Busy:
-            return Status::OpenedByOtherProcess;
-        case Errors::FileNotFound:
-        case Errors::DeviceNotConnected:
-            return Status::DeviceRemoved;
-        case Errors::SemaphoreTimeout:
-            return Status::TimedOut;
-        case Errors::NotEnoughMemory:
-            return Status::NoMemory;
-        default:
-            return Status::RequestFailed;
-    }
+    static constexpr std::pair<ErrorCode, ErrorCode> refusals[] = {
+        {Errors::Success, Status::Success},
+        {Errors::AccessDenied, Errors::AccessDenied},
+        {Errors::Busy, Status::OpenedByOtherProcess},
+        {Errors::FileNotFound, Status::DeviceRemoved},
+        {Errors::DeviceNotConnected, Status::DeviceRemoved},
+        {Errors::SemaphoreTimeout, Status::TimedOut},
+        {Errors::NotEnoughMemory, Status::NoMemory},
+    };
+    return LookUp(refusals, usbCode, Status::RequestFailed);
 }
 
 UsbIoDevice::UsbIoDevice(std::shared_ptr<SharedDevice> shared) : device_(std::move(shared)) {}
@@ -41,9 +35,6 @@ UsbIoDevice::~UsbIoDevice() {
 
 ErrorCode UsbIoDevice::Configure(std::span<const std::uint8_t> block) {
     const std::lock_guard holder(lock_);
-    if (device_->IsGone()) {
-        return Status::DeviceRemoved;
-    }
     if (configured_) {
         return Status::AlreadyConfigured;
     }
@@ -68,9 +59,6 @@ ErrorCode UsbIoDevice::Configure(std::span<const std::uint8_t> block) {
 
 ErrorCode UsbIoDevice::Unconfigure() {
     const std::lock_guard holder(lock_);
-    if (device_->IsGone()) {
-        return Status::DeviceRemoved;
-    }
     if (!bound_.empty()) {
         return Status::OpenPipes;
     }
@@ -83,9 +71,6 @@ ErrorCode UsbIoDevice::Unconfigure() {
 
 ErrorCode UsbIoDevice::Bind(std::uint8_t endpoint, Binding& binding) {
     const std::lock_guard holder(lock_);
-    if (device_->IsGone()) {
-        return Status::DeviceRemoved;
-    }
     if (!configured_) {
         return Status::NotConfigured;
     }
@@ -110,22 +95,14 @@ void UsbIoDevice::Unbind(Binding& binding) {
     binding = 0;
 }
 
-ErrorCode UsbIoDevice::ReadParameters(Parameters& target) {
+UsbIoDevice::Parameters UsbIoDevice::ReadParameters() {
     const std::lock_guard holder(lock_);
-    if (device_->IsGone()) {
-        return Status::DeviceRemoved;
-    }
-    target = parameters_;
-    return Status::Success;
+    return parameters_;
 }
 
-ErrorCode UsbIoDevice::WriteParameters(const Parameters& source) {
+void UsbIoDevice::WriteParameters(const Parameters& source) {
     const std::lock_guard holder(lock_);
-    if (device_->IsGone()) {
-        return Status::DeviceRemoved;
-    }
     parameters_ = source;
-    return Status::Success;
 }
 
 }  // namespace Varnholt::Platform::Drivers

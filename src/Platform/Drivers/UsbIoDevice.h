@@ -17,7 +17,7 @@ namespace Varnholt::Platform::Drivers {
 ErrorCode UsbIoRefusalOf(ErrorCode usbCode);
 
 /// The USBIO driver's state of one instrument, shared by the files that are open on it: the configuration,
-/// the bound pipes, the device parameters. Operations answer a USBIO status; all may be called from any
+/// the bound pipes, the device parameters. Codes are USBIO statuses; all operations may be called from any
 /// thread.
 class UsbIoDevice final {
   public:
@@ -39,8 +39,8 @@ class UsbIoDevice final {
     ErrorCode Bind(std::uint8_t endpoint, Binding& binding);
     void Unbind(Binding& binding);
 
-    ErrorCode ReadParameters(Parameters& target);
-    ErrorCode WriteParameters(const Parameters& source);
+    Parameters ReadParameters();
+    void WriteParameters(const Parameters& source);
 
     /// Largest transfer of the configuration; it does not change while a pipe is bound.
     std::uint32_t MaximumTransfer() const { return maximumTransfer_.load(std::memory_order_relaxed); }

@@ -5,6 +5,7 @@
 #include <limits>
 #include <utility>
 
+#include "Platform/LookUp.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/Instrument.h"
 #include "Protocol/UsbIoDriver.h"
@@ -48,9 +49,8 @@ ErrorCode CheckShape(std::uint32_t code, std::size_t inputSize, std::size_t outp
     return outputSize < shape->outputSize ? Status::OutputBufferTooSmall : Status::Success;
 }
 
-Decision Answer(ErrorCode status, std::size_t bytes = 0) {
-    return status == Status::Success ? Decision::Done(static_cast<std::uint32_t>(bytes))
-                                     : Decision::Refuse(status);
+Decision Answer(ErrorCode status) {
+    return status == Status::Success ? Decision::Done(0) : Decision::Refuse(status);
 }
 
 Decision DriverInfo(std::span<std::uint8_t> output) {
@@ -91,30 +91,32 @@ Decision UsbIoDriverFile::Control(std::uint32_t code, std::span<const std::uint8
     if (misshapen != Status::Success) {
         return Decision::Refuse(misshapen);
     }
+    if (code == UsbIo::Control::GetDriverInfo) {
+        return DriverInfo(output);
+    }
+    if (Device().IsGone()) {
+        return Decision::Refuse(Status::DeviceRemoved);
+    }
     switch (code) {
-        case UsbIo::Control::GetDriverInfo:
-            return DriverInfo(output);
         case UsbIo::Control::SetConfiguration:
             return Answer(usbIo_->Configure(input));
         case UsbIo::Control::UnconfigureDevice:
             return Answer(usbIo_->Unconfigure());
-        case UsbIo::Control::GetDeviceParameters: {
-            UsbIoDevice::Parameters parameters{};
-            const ErrorCode status = usbIo_->ReadParameters(parameters);
-            if (status == Status::Success) {
-                std::copy(parameters.begin(), parameters.end(), output.begin());
-            }
-            return Answer(status, parameters.size());
-        }
+        case UsbIo::Control::GetDeviceParameters:
+            std::ranges::copy(usbIo_->ReadParameters(), output.begin());
+            return Decision::Done(UsbIo::DeviceParametersSize);
         case UsbIo::Control::SetDeviceParameters: {
             UsbIoDevice::Parameters parameters{};
             std::copy_n(input.begin(), parameters.size(), parameters.begin());
-            return Answer(usbIo_->WriteParameters(parameters));
+            usbIo_->WriteParameters(parameters);
+            return Decision::Done(0);
         }
         case UsbIo::Control::BindPipe:
             return Answer(usbIo_->Bind(input[0], binding_));
-        case UsbIo::Control::AbortPipe:
-            return AbortPipe();
+        case UsbIo::Control::AbortPipe: {
+            const std::uint8_t endpoint = binding_.load();
+            return endpoint == 0 ? Decision::Refuse(Status::NotBound) : Abort(endpoint);
+        }
         default:
             return VendorRequest(code == UsbIo::Control::ClassOrVendorInRequest, input, output, transfer);
     }
@@ -123,9 +125,6 @@ Decision UsbIoDriverFile::Control(std::uint32_t code, std::span<const std::uint8
 Decision UsbIoDriverFile::VendorRequest(bool in, std::span<const std::uint8_t> block,
                                         std::span<std::uint8_t> data, Usb::Transfer& transfer) const {
     namespace Field = UsbIo::RequestBlock;
-    if (Device().IsGone()) {
-        return Decision::Refuse(Status::DeviceRemoved);
-    }
     if (Protocol::LoadLittle32(block.data() + Field::Type) != Field::TypeVendor) {
         return Decision::Refuse(Status::InvalidType);
     }
@@ -148,30 +147,16 @@ Decision UsbIoDriverFile::VendorRequest(bool in, std::span<const std::uint8_t> b
     return Decision::Send();
 }
 
-Decision UsbIoDriverFile::AbortPipe() const {
-    if (Device().IsGone()) {
-        return Decision::Refuse(Status::DeviceRemoved);
-    }
-    const std::uint8_t endpoint = binding_.load();
-    return endpoint == 0 ? Decision::Refuse(Status::NotBound) : Abort(endpoint);
-}
-
 ErrorCode UsbIoDriverFile::OutcomeOf(Usb::TransferStatus status) const {
-    switch (status) {
-        case Usb::TransferStatus::Completed:
-            return Status::Success;
-        case Usb::TransferStatus::Stalled:
-            return Status::EndpointHalted;
-        case Usb::TransferStatus::IoError:
-            return Status::TransactionError;
-        case Usb::TransferStatus::Overflow:
-            return Status::BabbleDetected;
-        case Usb::TransferStatus::Cancelled:
-            return Status::Cancelled;
-        case Usb::TransferStatus::DeviceGone:
-            return Status::DeviceRemoved;
-    }
-    return Status::RequestFailed;
+    static constexpr std::pair<Usb::TransferStatus, ErrorCode> outcomes[] = {
+        {Usb::TransferStatus::Completed, Status::Success},
+        {Usb::TransferStatus::Stalled, Status::EndpointHalted},
+        {Usb::TransferStatus::IoError, Status::TransactionError},
+        {Usb::TransferStatus::Overflow, Status::BabbleDetected},
+        {Usb::TransferStatus::Cancelled, Status::Cancelled},
+        {Usb::TransferStatus::DeviceGone, Status::DeviceRemoved},
+    };
+    return LookUp(outcomes, status, Status::RequestFailed);
 }
 
 std::uint32_t UsbIoDriverFile::TimeLimitOf(const Usb::Transfer& transfer) const {

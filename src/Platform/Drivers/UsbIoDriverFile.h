@@ -35,7 +35,6 @@ class UsbIoDriverFile final : public DriverFile {
   private:
     Decision VendorRequest(bool in, std::span<const std::uint8_t> block, std::span<std::uint8_t> data,
                            Usb::Transfer& transfer) const;
-    Decision AbortPipe() const;
 
     const std::shared_ptr<UsbIoDevice> usbIo_;
     UsbIoDevice::Binding binding_{0};

@@ -1,16 +1,15 @@
 #include "Platform/ErrorCodes.h"
 
+#include <utility>
+
+#include "Platform/LookUp.h"
+
 namespace Varnholt::Platform {
 namespace {
 
 thread_local ErrorCode lastError = Errors::Success;
 
-struct Message {
-    ErrorCode code;
-    const char* text;
-};
-
-constexpr Message Messages[] = {
+constexpr std::pair<ErrorCode, const char*> Messages[] = {
     {Errors::Success, "The operation completed successfully."},
     {Errors::FileNotFound, "The system cannot find the file specified."},
     {Errors::PathNotFound, "The system cannot find the path specified."},
@@ -50,12 +49,8 @@ void SetLastError(ErrorCode code) {
 }
 
 std::string ErrorText(ErrorCode code) {
-    for (const Message& message : Messages) {
-        if (message.code == code) {
-            return message.text;
-        }
-    }
-    return "Unknown error " + std::to_string(code) + ".";
+    const char* const text = LookUp(Messages, code, static_cast<const char*>(nullptr));
+    return text ? text : "Unknown error " + std::to_string(code) + ".";
 }
 
 }  // namespace Varnholt::Platform

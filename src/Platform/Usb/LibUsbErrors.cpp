@@ -2,9 +2,9 @@
 
 #include <libusb-1.0/libusb.h>
 
-#include <algorithm>
-#include <iterator>
 #include <utility>
+
+#include "Platform/LookUp.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
@@ -33,20 +33,14 @@ constexpr std::pair<int, TransferStatus> Statuses[] = {
     {LIBUSB_TRANSFER_TIMED_OUT, TransferStatus::Cancelled},
 };
 
-template <class Meaning, std::size_t Size>
-Meaning Find(const std::pair<int, Meaning> (&meanings)[Size], int number, Meaning others) {
-    const auto* const found = std::ranges::find(meanings, number, &std::pair<int, Meaning>::first);
-    return found != std::end(meanings) ? found->second : others;
-}
-
 }  // namespace
 
 ErrorCode ErrorFromLibUsb(int libusbError) {
-    return Find(Codes, libusbError, Errors::GeneralFailure);
+    return LookUp(Codes, libusbError, Errors::GeneralFailure);
 }
 
 TransferStatus StatusFromLibUsb(int libusbTransferStatus) {
-    return Find(Statuses, libusbTransferStatus, TransferStatus::IoError);
+    return LookUp(Statuses, libusbTransferStatus, TransferStatus::IoError);
 }
 
 }  // namespace Varnholt::Platform::Usb

@@ -11,6 +11,7 @@
 #include <utility>
 
 #include "Platform/Linux/HostSignalsBlocked.h"
+#include "Platform/LookUp.h"
 #include "Platform/Usb/UsbDescriptors.h"
 #include "Platform/Usb/UsbIpSocket.h"
 
@@ -45,16 +46,12 @@ class WaitedTransfer final : public Transfer, private TransferClient {
             lock.lock();
             completion_.wait(lock, [this] { return completed_; });
         }
-        switch (status) {
-            case TransferStatus::Completed:
-                return Errors::Success;
-            case TransferStatus::DeviceGone:
-                return Errors::DeviceNotConnected;
-            case TransferStatus::Cancelled:
-                return Errors::SemaphoreTimeout;
-            default:
-                return Errors::GeneralFailure;
-        }
+        static constexpr std::pair<TransferStatus, ErrorCode> codes[] = {
+            {TransferStatus::Completed, Errors::Success},
+            {TransferStatus::DeviceGone, Errors::DeviceNotConnected},
+            {TransferStatus::Cancelled, Errors::SemaphoreTimeout},
+        };
+        return LookUp(codes, status, Errors::GeneralFailure);
     }
 
   private:

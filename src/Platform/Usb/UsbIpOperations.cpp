@@ -2,7 +2,9 @@
 
 #include <array>
 #include <span>
+#include <utility>
 
+#include "Platform/LookUp.h"
 #include "Protocol/ByteOrder.h"
 
 namespace Varnholt::Platform::Usb {
@@ -25,18 +27,12 @@ std::optional<UsbIp::OperationHeader> Ask(UsbIpSocket& socket, UsbIp::Operation 
 }
 
 ErrorCode ErrorOfImport(UsbIp::OperationStatus status) {
-    switch (status) {
-        case UsbIp::OperationStatus::Ok:
-            return Errors::Success;
-        case UsbIp::OperationStatus::NotAvailable:
-        case UsbIp::OperationStatus::Busy:
-            return Errors::Busy;
-        case UsbIp::OperationStatus::NoDevice:
-            return Errors::DeviceNotConnected;
-        case UsbIp::OperationStatus::Failed:
-            break;
-    }
-    return Errors::GeneralFailure;
+    static constexpr std::pair<UsbIp::OperationStatus, ErrorCode> errors[] = {
+        {UsbIp::OperationStatus::NotAvailable, Errors::Busy},
+        {UsbIp::OperationStatus::Busy, Errors::Busy},
+        {UsbIp::OperationStatus::NoDevice, Errors::DeviceNotConnected},
+    };
+    return LookUp(errors, status, Errors::GeneralFailure);
 }
 
 }  // namespace
