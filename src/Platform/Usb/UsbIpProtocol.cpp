@@ -1,7 +1,9 @@
 #include "Platform/Usb/UsbIpProtocol.h"
 
 #include <algorithm>
+#include <utility>
 
+#include "Platform/LookUp.h"
 #include "Protocol/ByteOrder.h"
 
 namespace Varnholt::Platform::Usb::UsbIp {
@@ -35,8 +37,8 @@ class Writer final : Cursor<std::uint8_t> {
         return Put(
             +[](std::uint8_t* field, std::uint8_t byte) { *field = byte; }, value);
     }
-    Writer& Big16(std::uint16_t value) { return Put(Protocol::StoreBig16, value); }
-    Writer& Big32(std::uint32_t value) { return Put(Protocol::StoreBig32, value); }
+    Writer& Big16(auto value) { return Put(Protocol::StoreBig16, value); }
+    Writer& Big32(auto value) { return Put(Protocol::StoreBig32, value); }
     Writer& Little16(std::uint16_t value) { return Put(Protocol::StoreLittle16, value); }
     /// Zero-terminated, padded with zeros.
     Writer& Text(const std::string& text, std::size_t size) {
@@ -49,10 +51,10 @@ class Writer final : Cursor<std::uint8_t> {
     }
 
   private:
-    template <class Value>
-    Writer& Put(void (*store)(std::uint8_t*, Value), Value value) {
-        if (const auto field = Take(sizeof value); !field.empty()) {
-            store(field.data(), value);
+    template <class Number, class Value>
+    Writer& Put(void (*store)(std::uint8_t*, Number), Value value) {
+        if (const auto field = Take(sizeof(Number)); !field.empty()) {
+            store(field.data(), static_cast<Number>(value));
         }
         return *this;
     }
@@ -62,22 +64,25 @@ class Reader final : Cursor<const std::uint8_t> {
   public:
     explicit Reader(std::span<const std::uint8_t> message) : Cursor(message) {}
 
-    std::uint8_t Byte() {
-        return Get(+[](const std::uint8_t* field) { return *field; });
+    Reader& Byte(std::uint8_t& value) {
+        return Get(
+            +[](const std::uint8_t* field) { return *field; }, value);
     }
-    std::uint16_t Big16() { return Get(Protocol::LoadBig16); }
-    std::uint32_t Big32() { return Get(Protocol::LoadBig32); }
-    std::uint16_t Little16() { return Get(Protocol::LoadLittle16); }
-    std::string Text(std::size_t size) {
+    Reader& Big16(auto& value) { return Get(Protocol::LoadBig16, value); }
+    Reader& Big32(auto& value) { return Get(Protocol::LoadBig32, value); }
+    Reader& Little16(std::uint16_t& value) { return Get(Protocol::LoadLittle16, value); }
+    Reader& Text(std::string& text, std::size_t size) {
         const auto field = Take(size);
-        return {field.begin(), std::ranges::find(field, std::uint8_t{0})};
+        text.assign(field.begin(), std::ranges::find(field, std::uint8_t{0}));
+        return *this;
     }
 
   private:
-    template <class Value>
-    Value Get(Value (*load)(const std::uint8_t*)) {
-        const auto field = Take(sizeof(Value));
-        return field.empty() ? Value{0} : load(field.data());
+    template <class Number, class Value>
+    Reader& Get(Number (*load)(const std::uint8_t*), Value& value) {
+        const auto field = Take(sizeof(Number));
+        value = static_cast<Value>(field.empty() ? Number{0} : load(field.data()));
+        return *this;
     }
 };
 
@@ -90,66 +95,91 @@ constexpr std::uint32_t HighestEndpoint = 15;
 constexpr std::uint32_t NotIsochronous = 0xFFFFFFFF;
 constexpr std::uint32_t FlagIn = 0x200;
 
-struct StatusNumber {
-    std::int32_t number;
-    TransferStatus status;
-};
 /// The first of a status is the one that is sent.
-constexpr std::array StatusNumbers{
-    StatusNumber{LinuxStatus::Success, TransferStatus::Completed},
-    StatusNumber{LinuxStatus::BrokenPipe, TransferStatus::Stalled},
-    StatusNumber{LinuxStatus::ProtocolError, TransferStatus::IoError},
-    StatusNumber{LinuxStatus::Overflow, TransferStatus::Overflow},
-    StatusNumber{LinuxStatus::ConnectionReset, TransferStatus::Cancelled},
-    StatusNumber{LinuxStatus::NoEntry, TransferStatus::Cancelled},
-    StatusNumber{LinuxStatus::NoDevice, TransferStatus::DeviceGone},
-    StatusNumber{LinuxStatus::Shutdown, TransferStatus::DeviceGone},
+constexpr std::pair<std::int32_t, TransferStatus> Statuses[] = {
+    {LinuxStatus::Success, TransferStatus::Completed},
+    {LinuxStatus::BrokenPipe, TransferStatus::Stalled},
+    {LinuxStatus::ProtocolError, TransferStatus::IoError},
+    {LinuxStatus::Overflow, TransferStatus::Overflow},
+    {LinuxStatus::ConnectionReset, TransferStatus::Cancelled},
+    {LinuxStatus::NoEntry, TransferStatus::Cancelled},
+    {LinuxStatus::NoDevice, TransferStatus::DeviceGone},
+    {LinuxStatus::Shutdown, TransferStatus::DeviceGone},
 };
 
-void WriteCommon(Writer& writer, Command command, std::uint32_t sequence, std::uint32_t deviceId = 0,
-                 std::uint32_t direction = Out, std::uint32_t endpoint = 0) {
-    writer.Big32(static_cast<std::uint32_t>(command)).Big32(sequence).Big32(deviceId);
-    writer.Big32(direction).Big32(endpoint);
+/// What every packet begins with.
+struct Beginning {
+    Command command;
+    std::uint32_t sequence;
+    std::uint32_t deviceId = 0;
+    std::uint32_t direction = Out;
+    std::uint32_t endpoint = 0;
+};
+
+/// What a submission has beside the numbers of its packet.
+struct Framing {
+    std::uint32_t flags = 0;
+    std::uint32_t startFrame = 0;
+    std::uint32_t packets = 0;
+};
+
+// The fields of the messages in their order, for a writer and for a reader alike.
+
+void HeaderFields(auto message, auto& header) {
+    message.Big16(header.version).Big16(header.operation).Big32(header.status);
 }
 
-void Write(Writer& writer, const SubmitPacket& packet) {
-    WriteCommon(writer, Command::Submit, packet.sequence, packet.deviceId, packet.in ? In : Out,
-                packet.endpoint & HighestEndpoint);
-    writer.Big32(packet.in ? FlagIn : 0).Big32(packet.length).Big32(0).Big32(0).Big32(packet.interval);
-    writer.Byte(packet.setup.requestType).Byte(packet.setup.request).Little16(packet.setup.value);
-    writer.Little16(packet.setup.index).Little16(packet.setup.length);
-}
-void Write(Writer& writer, const UnlinkPacket& packet) {
-    WriteCommon(writer, Command::Unlink, packet.sequence, packet.deviceId);
-    writer.Big32(packet.victim);
-}
-void Write(Writer& writer, const SubmitReply& reply) {
-    WriteCommon(writer, Command::SubmitReply, reply.sequence);
-    writer.Big32(static_cast<std::uint32_t>(reply.status)).Big32(reply.actualLength);
-}
-void Write(Writer& writer, const UnlinkReply& reply) {
-    WriteCommon(writer, Command::UnlinkReply, reply.sequence);
-    writer.Big32(static_cast<std::uint32_t>(reply.status));
+void RecordFields(auto message, auto& record) {
+    message.Text(record.path, PathSize).Text(record.busId, BusIdSize);
+    message.Big32(record.busNumber).Big32(record.deviceNumber).Big32(record.speed);
+    message.Big16(record.vendorId).Big16(record.productId).Big16(record.version);
+    message.Byte(record.classes[0]).Byte(record.classes[1]).Byte(record.classes[2]);
+    message.Byte(record.configurationValue).Byte(record.configurations).Byte(record.interfaces);
 }
 
-std::optional<Packet> ReadSubmit(Reader& reader, SubmitPacket packet, std::uint32_t direction,
-                                 std::uint32_t endpoint) {
-    reader.Big32();  // flags: the direction is known already
-    packet.length = reader.Big32();
-    reader.Big32();  // start frame
-    const std::uint32_t packets = reader.Big32();
-    packet.interval = reader.Big32();
-    packet.setup.requestType = reader.Byte();
-    packet.setup.request = reader.Byte();
-    packet.setup.value = reader.Little16();
-    packet.setup.index = reader.Little16();
-    packet.setup.length = reader.Little16();
-    if (direction > In || endpoint > HighestEndpoint || packet.length > MaximumPayload ||
-        (packets != 0 && packets != NotIsochronous)) {
+void BeginningFields(auto& message, auto&& beginning) {
+    message.Big32(beginning.command).Big32(beginning.sequence).Big32(beginning.deviceId);
+    message.Big32(beginning.direction).Big32(beginning.endpoint);
+}
+
+void SubmissionFields(auto& message, auto& packet, auto&& framing) {
+    message.Big32(framing.flags).Big32(packet.length).Big32(framing.startFrame);
+    message.Big32(framing.packets).Big32(packet.interval);
+    message.Byte(packet.setup.requestType).Byte(packet.setup.request).Little16(packet.setup.value);
+    message.Little16(packet.setup.index).Little16(packet.setup.length);
+}
+
+void Write(Writer& message, const SubmitPacket& packet) {
+    BeginningFields(message, Beginning{Command::Submit, packet.sequence, packet.deviceId,
+                                       packet.in ? In : Out, packet.endpoint & HighestEndpoint});
+    SubmissionFields(message, packet, Framing{.flags = packet.in ? FlagIn : 0});
+}
+void Write(Writer& message, const UnlinkPacket& packet) {
+    BeginningFields(message, Beginning{Command::Unlink, packet.sequence, packet.deviceId});
+    message.Big32(packet.victim);
+}
+void Write(Writer& message, const SubmitReply& reply) {
+    BeginningFields(message, Beginning{Command::SubmitReply, reply.sequence});
+    message.Big32(reply.status).Big32(reply.actualLength);
+}
+void Write(Writer& message, const UnlinkReply& reply) {
+    BeginningFields(message, Beginning{Command::UnlinkReply, reply.sequence});
+    message.Big32(reply.status);
+}
+
+std::optional<Packet> ReadSubmit(Reader& message, const Beginning& beginning) {
+    SubmitPacket packet;
+    Framing framing;  // its flags only repeat the direction
+    SubmissionFields(message, packet, framing);
+    if (beginning.direction > In || beginning.endpoint > HighestEndpoint || packet.length > MaximumPayload ||
+        (framing.packets != 0 && framing.packets != NotIsochronous)) {
         return std::nullopt;
     }
-    packet.in = direction == In;
-    packet.endpoint = static_cast<std::uint8_t>(endpoint != 0 && packet.in ? endpoint | 0x80 : endpoint);
+    packet.sequence = beginning.sequence;
+    packet.deviceId = beginning.deviceId;
+    packet.in = beginning.direction == In;
+    const std::uint32_t direction = beginning.endpoint != 0 && packet.in ? 0x80 : 0;
+    packet.endpoint = static_cast<std::uint8_t>(beginning.endpoint | direction);
     return packet;
 }
 
@@ -157,50 +187,25 @@ std::optional<Packet> ReadSubmit(Reader& reader, SubmitPacket packet, std::uint3
 
 OperationBytes Encode(const OperationHeader& header) {
     OperationBytes bytes{};
-    Writer(bytes)
-        .Big16(header.version)
-        .Big16(static_cast<std::uint16_t>(header.operation))
-        .Big32(static_cast<std::uint32_t>(header.status));
+    HeaderFields(Writer(bytes), header);
     return bytes;
 }
 
 OperationHeader DecodeOperation(std::span<const std::uint8_t, OperationHeaderSize> bytes) {
-    Reader reader(bytes);
     OperationHeader header;
-    header.version = reader.Big16();
-    header.operation = static_cast<Operation>(reader.Big16());
-    header.status = static_cast<OperationStatus>(reader.Big32());
+    HeaderFields(Reader(bytes), header);
     return header;
 }
 
 DeviceRecordBytes Encode(const DeviceRecord& record) {
     DeviceRecordBytes bytes{};
-    Writer writer(bytes);
-    writer.Text(record.path, PathSize).Text(record.busId, BusIdSize);
-    writer.Big32(record.busNumber).Big32(record.deviceNumber).Big32(record.speed);
-    writer.Big16(record.vendorId).Big16(record.productId).Big16(record.version);
-    writer.Byte(record.classes[0]).Byte(record.classes[1]).Byte(record.classes[2]);
-    writer.Byte(record.configurationValue).Byte(record.configurations).Byte(record.interfaces);
+    RecordFields(Writer(bytes), record);
     return bytes;
 }
 
 DeviceRecord DecodeDeviceRecord(std::span<const std::uint8_t, DeviceRecordSize> bytes) {
-    Reader reader(bytes);
     DeviceRecord record;
-    record.path = reader.Text(PathSize);
-    record.busId = reader.Text(BusIdSize);
-    record.busNumber = reader.Big32();
-    record.deviceNumber = reader.Big32();
-    record.speed = reader.Big32();
-    record.vendorId = reader.Big16();
-    record.productId = reader.Big16();
-    record.version = reader.Big16();
-    for (std::uint8_t& number : record.classes) {
-        number = reader.Byte();
-    }
-    record.configurationValue = reader.Byte();
-    record.configurations = reader.Byte();
-    record.interfaces = reader.Byte();
+    RecordFields(Reader(bytes), record);
     return record;
 }
 
@@ -211,50 +216,50 @@ BusIdBytes EncodeBusId(const std::string& busId) {
 }
 
 std::string DecodeBusId(std::span<const std::uint8_t, BusIdSize> bytes) {
-    return Reader(bytes).Text(BusIdSize);
+    std::string busId;
+    Reader(bytes).Text(busId, BusIdSize);
+    return busId;
 }
 
 PacketBytes Encode(const Packet& packet) {
     PacketBytes bytes{};
-    Writer writer(bytes);
-    std::visit([&writer](const auto& kind) { Write(writer, kind); }, packet);
+    Writer message(bytes);
+    std::visit([&message](const auto& kind) { Write(message, kind); }, packet);
     return bytes;
 }
 
 std::optional<Packet> DecodePacket(std::span<const std::uint8_t, PacketHeaderSize> bytes) {
-    Reader reader(bytes);
-    const auto command = static_cast<Command>(reader.Big32());
-    const std::uint32_t sequence = reader.Big32();
-    const std::uint32_t deviceId = reader.Big32();
-    const std::uint32_t direction = reader.Big32();
-    const std::uint32_t endpoint = reader.Big32();
-    switch (command) {
-        case Command::Submit: {
-            SubmitPacket packet;
-            packet.sequence = sequence;
-            packet.deviceId = deviceId;
-            return ReadSubmit(reader, packet, direction, endpoint);
+    Reader message(bytes);
+    Beginning beginning{};
+    BeginningFields(message, beginning);
+    switch (beginning.command) {
+        case Command::Submit:
+            return ReadSubmit(message, beginning);
+        case Command::Unlink: {
+            UnlinkPacket packet{beginning.sequence, beginning.deviceId};
+            message.Big32(packet.victim);
+            return packet;
         }
-        case Command::Unlink:
-            return UnlinkPacket{sequence, deviceId, reader.Big32()};
         case Command::SubmitReply: {
-            SubmitReply reply{sequence, static_cast<std::int32_t>(reader.Big32()), 0};
-            reply.actualLength = reader.Big32();
+            SubmitReply reply{beginning.sequence};
+            message.Big32(reply.status).Big32(reply.actualLength);
             return reply.actualLength <= MaximumPayload ? std::optional<Packet>(reply) : std::nullopt;
         }
-        case Command::UnlinkReply:
-            return UnlinkReply{sequence, static_cast<std::int32_t>(reader.Big32())};
+        case Command::UnlinkReply: {
+            UnlinkReply reply{beginning.sequence};
+            message.Big32(reply.status);
+            return reply;
+        }
     }
     return std::nullopt;
 }
 
 std::int32_t StatusOf(TransferStatus status) {
-    return std::ranges::find(StatusNumbers, status, &StatusNumber::status)->number;
+    return std::ranges::find(Statuses, status, &std::pair<std::int32_t, TransferStatus>::second)->first;
 }
 
 TransferStatus TransferStatusOf(std::int32_t status) {
-    const auto known = std::ranges::find(StatusNumbers, status, &StatusNumber::number);
-    return known == StatusNumbers.end() ? TransferStatus::IoError : known->status;
+    return LookUp(Statuses, status, TransferStatus::IoError);
 }
 
 }  // namespace Varnholt::Platform::Usb::UsbIp
