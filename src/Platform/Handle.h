@@ -1,6 +1,6 @@
 #pragma once
 
-#include <utility>
+#include "Platform/Owned.h"
 
 namespace Varnholt::Platform {
 
@@ -18,30 +18,7 @@ Handle InvalidHandle();
 /// Closes a waitable object or thread handle. The object lives on while a wait or a thread still needs it.
 bool Close(Handle handle);
 
-/// Owns one waitable object or thread handle and closes it.
-class OwnedHandle final {
-  public:
-    OwnedHandle() = default;
-    explicit OwnedHandle(Handle owned) : handle_(owned) {}
-    OwnedHandle(OwnedHandle&& other) noexcept : handle_(std::exchange(other.handle_, NoHandle)) {}
-    OwnedHandle& operator=(OwnedHandle&& other) noexcept {
-        std::swap(handle_, other.handle_);
-        return *this;
-    }
-    ~OwnedHandle() { Reset(); }
-
-    Handle Get() const { return handle_; }
-    explicit operator bool() const { return handle_ != NoHandle; }
-    /// The handle is the caller's from here on.
-    Handle Release() { return std::exchange(handle_, NoHandle); }
-    void Reset() {
-        if (handle_ != NoHandle) {
-            Close(Release());
-        }
-    }
-
-  private:
-    Handle handle_ = NoHandle;
-};
+/// Owns one waitable object or thread handle.
+using OwnedHandle = Owned<Handle, NoHandle, Close>;
 
 }  // namespace Varnholt::Platform
