@@ -4,7 +4,6 @@
 #include <mutex>
 #include <new>
 #include <optional>
-#include <shared_mutex>
 #include <string_view>
 #include <utility>
 
@@ -14,6 +13,7 @@
 #include "Platform/Drivers/RecordState.h"
 #include "Platform/Drivers/UsbIoDevice.h"
 #include "Platform/Drivers/UsbIoDriverFile.h"
+#include "Platform/HandleMap.h"
 #include "Platform/WaitableObjects.h"
 #include "Protocol/NativeDriver.h"
 #include "Protocol/UsbIoDriver.h"
@@ -44,22 +44,11 @@ std::optional<DevicePath> Parse(std::string_view path) {
     return DevicePath{isUsbIo, std::string(name), pipe};
 }
 
-/// Handles of files have the top bit set, which no handle of the system has, and the second lowest, which
-/// these have clear.
-namespace HandleLayout {
-constexpr std::uint32_t Mark = 0x80000002;
-constexpr std::uint32_t NumberShift = 2;
-constexpr std::uint32_t NumberMask = (1U << 29) - 1;
-}  // namespace HandleLayout
+/// Handles of files have the top bit set, which no handle of the system has.
+constexpr std::uintptr_t FirstHandle = 0x80000002;
 
 /// More than any host needs: one that forgets to close files is told.
 constexpr std::size_t MostOpenFiles = 1024;
-
-Handle MakeHandle(std::uint32_t number) {
-    const std::uint32_t value = HandleLayout::Mark | (number & HandleLayout::NumberMask)
-                                                         << HandleLayout::NumberShift;
-    return reinterpret_cast<Handle>(static_cast<std::uintptr_t>(value));
-}
 
 class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller {
   public:
@@ -86,9 +75,6 @@ class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller
     };
 
     std::unique_ptr<DriverFile> OpenOnDevice(const DevicePath& path, ErrorCode& error);
-    std::shared_ptr<OpenFile> Find(Handle file) const;
-    std::shared_ptr<OpenFile> FindBehind(Handle& file) const;
-    Handle Add(std::unique_ptr<DriverFile> driver, ErrorCode& error);
     bool Start(std::string_view call, Handle file, const Operation& operation, Overlapped& record);
 
     Usb::UsbBus& bus_;
@@ -97,29 +83,24 @@ class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller
     RecursiveMutex opening_;
     std::map<std::string, OpenDevice> devices_;
 
-    mutable std::shared_mutex filesLock_;  ///< guards what follows, for a few instructions
-    std::map<Handle, std::shared_ptr<OpenFile>> files_;
-    std::uint32_t lastNumber_ = 0;
+    HandleMap<OpenFile, FirstHandle> files_;
 };
 
 DriverFileSystem::~DriverFileSystem() {
-    for (const auto& [handle, file] : files_) {
-        file->Close();
+    Handle file = NoHandle;
+    while (const std::shared_ptr<OpenFile> open = files_.FindBehind(file)) {
+        open->Close();
     }
 }
 
 std::vector<std::string> DriverFileSystem::ListInterfaces(const Protocol::Guid& interfaceClass) {
-    std::string_view prefix;
-    if (interfaceClass == Protocol::NativeDriver::InterfaceClass) {
-        prefix = NativePrefix;
-    } else if (interfaceClass == Protocol::UsbIoDriver::InterfaceClass) {
-        prefix = UsbIoPrefix;
-    } else {
+    const bool isUsbIo = interfaceClass == Protocol::UsbIoDriver::InterfaceClass;
+    if (!isUsbIo && interfaceClass != Protocol::NativeDriver::InterfaceClass) {
         return {};
     }
     std::vector<std::string> paths = bus_.List();
     for (std::string& path : paths) {
-        path.insert(0, prefix);
+        path.insert(0, isUsbIo ? UsbIoPrefix : NativePrefix);
     }
     return paths;
 }
@@ -134,9 +115,10 @@ Handle DriverFileSystem::Open(const std::string& path) {
         if (parsed) {
             const std::lock_guard holder(opening_);
             std::unique_ptr<DriverFile> driver = OpenOnDevice(*parsed, error);
-            if (const Handle file = driver ? Add(std::move(driver), error) : NoHandle) {
-                return file;
+            if (driver && files_.Size() < MostOpenFiles) {
+                return files_.Add(std::make_shared<OpenFile>(std::move(driver)));
             }
+            error = driver ? Errors::NoSystemResources : error;
         }
     } catch (const std::bad_alloc&) {
         error = Errors::NotEnoughMemory;
@@ -170,43 +152,11 @@ std::unique_ptr<DriverFile> DriverFileSystem::OpenOnDevice(const DevicePath& pat
     return std::make_unique<UsbIoDriverFile>(std::move(usbIo), *this);
 }
 
-Handle DriverFileSystem::Add(std::unique_ptr<DriverFile> driver, ErrorCode& error) {
-    const auto file = std::make_shared<OpenFile>(std::move(driver));
-    const std::lock_guard guard(filesLock_);
-    if (files_.size() >= MostOpenFiles) {
-        error = Errors::NoSystemResources;
-        return NoHandle;
-    }
-    for (;;) {
-        const Handle handle = MakeHandle(++lastNumber_);
-        if (files_.emplace(handle, file).second) {
-            return handle;
-        }
-    }
-}
-
-std::shared_ptr<OpenFile> DriverFileSystem::Find(Handle file) const {
-    const std::shared_lock guard(filesLock_);
-    const auto found = files_.find(file);
-    return found != files_.end() ? found->second : nullptr;
-}
-
-/// The next file in order, whose handle `file` becomes; null behind the last.
-std::shared_ptr<OpenFile> DriverFileSystem::FindBehind(Handle& file) const {
-    const std::shared_lock guard(filesLock_);
-    const auto next = files_.upper_bound(file);
-    if (next == files_.end()) {
-        return nullptr;
-    }
-    file = next->first;
-    return next->second;
-}
-
 bool DriverFileSystem::CloseFile(Handle file) {
     if (CallMustFail("CloseFile")) {
         return false;
     }
-    const std::shared_ptr<OpenFile> open = Find(file);
+    const std::shared_ptr<OpenFile> open = files_.Find(file);
     std::unique_ptr<DriverFile> driver = open ? open->Close() : nullptr;
     if (!driver) {
         SetLastError(Errors::InvalidHandle);
@@ -215,8 +165,7 @@ bool DriverFileSystem::CloseFile(Handle file) {
     const std::lock_guard holder(opening_);
     driver.reset();
     std::erase_if(devices_, [](const auto& entry) { return entry.second.device.expired(); });
-    const std::lock_guard guard(filesLock_);
-    files_.erase(file);
+    files_.Take(file);
     return true;
 }
 
@@ -225,7 +174,7 @@ bool DriverFileSystem::Start(std::string_view call, Handle file, const Operation
     if (CallMustFail(call)) {
         return RefuseStart(record, LastError());
     }
-    const std::shared_ptr<OpenFile> open = Find(file);
+    const std::shared_ptr<OpenFile> open = files_.Find(file);
     if (!open) {
         return RefuseStart(record, Errors::InvalidHandle);
     }
@@ -258,7 +207,7 @@ bool DriverFileSystem::StartControl(Handle file, std::uint32_t code, const void*
 
 bool DriverFileSystem::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) {
     if (IsRunning(record)) {
-        const std::shared_ptr<OpenFile> open = wait ? Find(file) : nullptr;
+        const std::shared_ptr<OpenFile> open = wait ? files_.Find(file) : nullptr;
         if (!open || !open->WaitFor(record)) {
             transferred = 0;
             SetLastError(Errors::IoIncomplete);
@@ -278,7 +227,7 @@ bool DriverFileSystem::CancelTransfers(Handle file) {
     if (CallMustFail("CancelTransfers")) {
         return false;
     }
-    const std::shared_ptr<OpenFile> open = Find(file);
+    const std::shared_ptr<OpenFile> open = files_.Find(file);
     if (!open) {
         SetLastError(Errors::InvalidHandle);
         return false;
@@ -289,7 +238,7 @@ bool DriverFileSystem::CancelTransfers(Handle file) {
 
 void DriverFileSystem::CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) {
     Handle file = NoHandle;
-    while (const std::shared_ptr<OpenFile> open = FindBehind(file)) {
+    while (const std::shared_ptr<OpenFile> open = files_.FindBehind(file)) {
         open->CancelEndpoint(device, endpoint);
     }
 }

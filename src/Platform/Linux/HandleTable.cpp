@@ -4,17 +4,6 @@
 
 namespace Varnholt::Platform {
 namespace Linux {
-namespace {
-
-/// Handles of waitable objects are 1 modulo 4 (see Handle.h).
-constexpr std::uintptr_t Step = 4;
-constexpr std::uintptr_t FirstValue = 1;
-
-std::uintptr_t Value(Handle handle) {
-    return reinterpret_cast<std::uintptr_t>(handle);
-}
-
-}  // namespace
 
 HandleTable& HandleTable::Instance() {
     static NoDestructor<HandleTable> table;
@@ -26,36 +15,19 @@ Handle HandleTable::Add(ObjectRef object) {
         const DispatcherLock hold;
         ++object->handles_;
     }
-    const std::unique_lock held(lock_);
-    do {
-        last_ = last_ == 0 ? FirstValue : last_ + Step;
-    } while (objects_.contains(last_));
-    objects_.emplace(last_, std::move(object));
-    return reinterpret_cast<Handle>(last_);
+    return objects_.Add(std::move(object));
 }
 
 ObjectRef HandleTable::Find(Handle handle) {
-    {
-        const std::shared_lock held(lock_);
-        const auto found = objects_.find(Value(handle));
-        if (found != objects_.end()) {
-            return found->second;
-        }
+    ObjectRef object = objects_.Find(handle);
+    if (!object) {
+        SetLastError(Errors::InvalidHandle);
     }
-    SetLastError(Errors::InvalidHandle);
-    return nullptr;
+    return object;
 }
 
 bool HandleTable::Close(Handle handle) {
-    ObjectRef object;  // dies without a lock held: its end may be a matter of files or threads
-    {
-        const std::unique_lock held(lock_);
-        const auto found = objects_.find(Value(handle));
-        if (found != objects_.end()) {
-            object = std::move(found->second);
-            objects_.erase(found);
-        }
-    }
+    const ObjectRef object = objects_.Take(handle);  // dies without a lock held: its end may take time
     if (!object) {
         SetLastError(Errors::InvalidHandle);
         return false;

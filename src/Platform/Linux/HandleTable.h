@@ -1,18 +1,15 @@
 #pragma once
 
-#include <cstdint>
-#include <map>
 #include <new>
-#include <shared_mutex>
 #include <string_view>
 
 #include "Platform/CallFilter.h"
+#include "Platform/HandleMap.h"
 #include "Platform/Linux/WaitableObject.h"
 
 namespace Varnholt::Platform::Linux {
 
-/// Says which handle names which waitable object. A value that was never handed out, or whose object was
-/// closed, names nothing; values are not used twice as long as there are others.
+/// Says which handle names which waitable object.
 class HandleTable final {
   public:
     static HandleTable& Instance();
@@ -32,9 +29,7 @@ class HandleTable final {
     bool Close(Handle handle);
 
   private:
-    std::shared_mutex lock_;
-    std::map<std::uintptr_t, ObjectRef> objects_;  // guarded by `lock`
-    std::uintptr_t last_ = 0;                      // guarded by `lock`
+    HandleMap<WaitableObject, 1> objects_;
 };
 
 /// Runs what makes an object and its handle, unless the platform call must fail. Without memory for them
