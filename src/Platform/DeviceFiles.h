@@ -41,7 +41,7 @@ class DeviceFileSystem {
     virtual std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) = 0;
     /// As `DeviceInterfaces::MakeList`.
     virtual DeviceList MakeList(const Protocol::Guid& interfaceClass, bool /*withRegistryFallback*/) {
-        return std::make_shared<PathList>(interfaceClass, ListInterfaces(interfaceClass));
+        return std::make_shared<InterfaceList>(interfaceClass, ListInterfaces(interfaceClass));
     }
 
     /// Opens an existing device or pipe for reading and writing, shared, overlapped. `InvalidHandle()` on

@@ -21,7 +21,14 @@ ErrorCode DeviceInterfaces::ReadPath(const DeviceList& list, const Protocol::Gui
     if (CallMustFail("ReadPath")) {
         return LastError();
     }
-    return list ? list->ReadPath(interfaceClass, index, path) : Errors::InvalidHandle;
+    if (!list) {
+        return Errors::InvalidHandle;
+    }
+    if (interfaceClass != list->interfaceClass || index >= list->entries.size()) {
+        return Errors::NoMoreItems;
+    }
+    path = list->entries[index].path;
+    return list->entries[index].code;
 }
 
 }  // namespace Varnholt::Platform

@@ -3,7 +3,6 @@
 #include <cstdint>
 #include <memory>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "Platform/ErrorCodes.h"
@@ -12,31 +11,20 @@
 namespace Varnholt::Platform {
 
 /// A snapshot of the interfaces of one class that are present.
-class InterfaceList {
-  public:
-    virtual ~InterfaceList() = default;
-    /// As `DeviceInterfaces::ReadPath`.
-    virtual ErrorCode ReadPath(const Protocol::Guid& interfaceClass, std::uint32_t index,
-                               std::string& path) const = 0;
-};
-
-class PathList final : public InterfaceList {
-  public:
-    PathList(const Protocol::Guid& interfaceClass, std::vector<std::string> paths)
-        : class_(interfaceClass), paths_(std::move(paths)) {}
-
-    ErrorCode ReadPath(const Protocol::Guid& interfaceClass, std::uint32_t index,
-                       std::string& path) const override {
-        if (interfaceClass != class_ || index >= paths_.size()) {
-            return Errors::NoMoreItems;
+struct InterfaceList {
+    struct Entry {
+        ErrorCode code = Errors::Success;  ///< why the platform does not say the path
+        std::string path;
+    };
+    explicit InterfaceList(const Protocol::Guid& listedClass, const std::vector<std::string>& paths = {})
+        : interfaceClass(listedClass) {
+        for (const std::string& path : paths) {
+            entries.push_back({Errors::Success, path});
         }
-        path = paths_[index];
-        return Errors::Success;
     }
 
-  private:
-    const Protocol::Guid class_;
-    const std::vector<std::string> paths_;
+    const Protocol::Guid interfaceClass;
+    std::vector<Entry> entries;
 };
 
 /// Null where no list could be made.

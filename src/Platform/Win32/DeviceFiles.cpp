@@ -36,7 +36,7 @@ class WindowsDeviceFiles final : public DeviceFileSystem {
 
     DeviceList MakeList(const Protocol::Guid& interfaceClass, bool withRegistryFallback) override {
         if (withRegistryFallback && HostKeepsInterfacesInRegistry()) {
-            return std::make_shared<PathList>(interfaceClass, ListRegistryInterfaces(interfaceClass));
+            return std::make_shared<InterfaceList>(interfaceClass, ListRegistryInterfaces(interfaceClass));
         }
         return SystemSetupApi().MakeList(interfaceClass);
     }
@@ -44,13 +44,9 @@ class WindowsDeviceFiles final : public DeviceFileSystem {
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override {
         std::vector<std::string> paths;
         const DeviceList list = MakeList(interfaceClass, true);
-        std::string path;
-        for (std::uint32_t index = 0; list; ++index) {
-            const ErrorCode code = list->ReadPath(interfaceClass, index, path);
-            if (code == Errors::Success) {
-                paths.push_back(path);
-            } else if (code != Errors::NoInterfaceDetail) {
-                break;
+        for (const InterfaceList::Entry& entry : list ? list->entries : std::vector<InterfaceList::Entry>()) {
+            if (entry.code == Errors::Success) {
+                paths.push_back(entry.path);
             }
         }
         return paths;

@@ -23,39 +23,23 @@ ErrorCode FailureOfCall() {
     return code == Errors::Success ? Errors::NoInterfaceDetail : code;
 }
 
-class SetupApiList final : public InterfaceList {
-  public:
-    SetupApiList(const SetupApi::EntryPoints& entryPoints, HDEVINFO deviceInfo)
-        : api_(entryPoints), list_(deviceInfo) {}
-    ~SetupApiList() override { api_.destroyDeviceInfoList(list_); }
-
-    ErrorCode ReadPath(const Protocol::Guid& interfaceClass, std::uint32_t index,
-                       std::string& path) const override {
-        SP_DEVICE_INTERFACE_DATA record{};
-        record.cbSize = sizeof record;
-        if (!api_.enumDeviceInterfaces(list_, nullptr, SystemGuid(interfaceClass), index, &record)) {
-            return FailureOfCall();
-        }
-        DWORD size = 0;
-        api_.getDeviceInterfaceDetail(list_, &record, nullptr, 0, &size, nullptr);
-        constexpr std::size_t pathOffset = offsetof(SP_DEVICE_INTERFACE_DETAIL_DATA_A, DevicePath);
-        if (size <= pathOffset) {
-            return Errors::NoInterfaceDetail;
-        }
-        std::vector<std::byte> bytes(size + 1);  // the path ends inside, whatever the system fills in
-        auto* const detail = reinterpret_cast<SP_DEVICE_INTERFACE_DETAIL_DATA_A*>(bytes.data());
-        detail->cbSize = sizeof *detail;
-        if (!api_.getDeviceInterfaceDetail(list_, &record, detail, size, nullptr, nullptr)) {
-            return FailureOfCall();
-        }
-        path = reinterpret_cast<const char*>(bytes.data() + pathOffset);
-        return Errors::Success;
+/// The path of an interface, or why there is none.
+InterfaceList::Entry ReadDetail(const SetupApi::EntryPoints& api, HDEVINFO list,
+                                SP_DEVICE_INTERFACE_DATA& record) {
+    DWORD size = 0;
+    api.getDeviceInterfaceDetail(list, &record, nullptr, 0, &size, nullptr);
+    constexpr std::size_t pathOffset = offsetof(SP_DEVICE_INTERFACE_DETAIL_DATA_A, DevicePath);
+    if (size <= pathOffset) {
+        return {Errors::NoInterfaceDetail, {}};
     }
-
-  private:
-    const SetupApi::EntryPoints& api_;
-    const HDEVINFO list_;
-};
+    std::vector<std::byte> bytes(size + 1);  // the path ends inside, whatever the system fills in
+    auto* const detail = reinterpret_cast<SP_DEVICE_INTERFACE_DETAIL_DATA_A*>(bytes.data());
+    detail->cbSize = sizeof *detail;
+    if (!api.getDeviceInterfaceDetail(list, &record, detail, size, nullptr, nullptr)) {
+        return {FailureOfCall(), {}};
+    }
+    return {Errors::Success, reinterpret_cast<const char*>(bytes.data() + pathOffset)};
+}
 
 }  // namespace
 
@@ -104,12 +88,27 @@ DeviceList SetupApi::MakeList(const Protocol::Guid& interfaceClass) {
     if (!Load()) {
         return nullptr;
     }
-    const HDEVINFO list = entryPoints_.getClassDevs(SystemGuid(interfaceClass), nullptr, nullptr,
-                                                    DIGCF_PRESENT | DIGCF_DEVICEINTERFACE);
-    if (list == nullptr || list == InvalidHandle()) {
+    const HDEVINFO system = entryPoints_.getClassDevs(SystemGuid(interfaceClass), nullptr, nullptr,
+                                                      DIGCF_PRESENT | DIGCF_DEVICEINTERFACE);
+    if (system == nullptr || system == InvalidHandle()) {
         return nullptr;
     }
-    return std::make_shared<SetupApiList>(entryPoints_, list);
+    const struct Owner {
+        const EntryPoints& api;
+        HDEVINFO system;
+        ~Owner() { api.destroyDeviceInfoList(system); }
+    } owner{entryPoints_, system};
+    auto list = std::make_shared<InterfaceList>(interfaceClass);
+    SP_DEVICE_INTERFACE_DATA record{};
+    record.cbSize = sizeof record;
+    while (entryPoints_.enumDeviceInterfaces(system, nullptr, SystemGuid(interfaceClass),
+                                             static_cast<DWORD>(list->entries.size()), &record)) {
+        list->entries.push_back(ReadDetail(entryPoints_, system, record));
+    }
+    if (const ErrorCode end = FailureOfCall(); end != Errors::NoMoreItems) {
+        list->entries.push_back({end, {}});
+    }
+    return list;
 }
 
 }  // namespace Varnholt::Platform

@@ -27,8 +27,7 @@ class SetupApi final {
 
     /// False, with the reason in `LastError`, when the library or one of its entry points cannot be had.
     bool Load();
-    /// The present interfaces of a class; null, with the reason in `LastError`, on failure. The list must not
-    /// outlive the object.
+    /// The present interfaces of a class; null, with the reason in `LastError`, on failure.
     DeviceList MakeList(const Protocol::Guid& interfaceClass);
 
   private:
