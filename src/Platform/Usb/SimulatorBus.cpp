@@ -46,21 +46,21 @@ std::set<std::string> ListeningSockets() {
 /// A connection whose other end was looked at.
 struct Connection {
     Linux::FileDescriptor file;
-    PeerCredentials peer{};
-    bool usable = false;
+    SimulatorInfo info;
 };
 
 /// Nothing, with the reason in `errno`, where there is no connection.
 std::optional<Connection> Connect(const std::string& name) {
-    Connection connection;
-    connection.file = Linux::FileDescriptor(ConnectToSimulator(name));
+    Connection connection{Linux::FileDescriptor(ConnectToSimulator(name)), {}};
     if (!connection.file) {
         return std::nullopt;
     }
+    connection.info.name = SimulatedPrefix + name;
     if (const auto peer = CredentialsOfPeer(connection.file.Get())) {
-        connection.peer = *peer;
+        connection.info.userId = peer->userId;
+        connection.info.processId = peer->processId;
         // Root's would refuse anybody else, and root trusts no other user's.
-        connection.usable = peer->userId == geteuid();
+        connection.info.usable = peer->userId == geteuid();
     }
     return connection;
 }
@@ -68,7 +68,7 @@ std::optional<Connection> Connect(const std::string& name) {
 UsbIpConnector ConnectorTo(const std::string& name) {
     return [name](ErrorCode& error) {
         auto connection = Connect(name);
-        if (connection && connection->usable) {
+        if (connection && connection->info.usable) {
             error = Errors::Success;
             return connection->file.Release();
         }
@@ -76,20 +76,6 @@ UsbIpConnector ConnectorTo(const std::string& name) {
         error = isDenied ? Errors::AccessDenied : Errors::DeviceNotConnected;
         return -1;
     };
-}
-
-/// As `Connect`, which it does.
-std::optional<SimulatorInfo> Describe(const std::string& name) {
-    const auto connection = Connect(name);
-    if (!connection) {
-        return std::nullopt;
-    }
-    SimulatorInfo info;
-    info.name = SimulatedPrefix + name;
-    info.userId = connection->peer.userId;
-    info.processId = connection->peer.processId;
-    info.usable = connection->usable;
-    return info;
 }
 
 /// Finds out who uses it: the simulator writes who has opened the instrument behind its path.
@@ -125,7 +111,7 @@ class SimulatorsOfThisUser final : public UsbBus {
     std::shared_ptr<UsbDevice> Open(const std::string& prefixedName, ErrorCode& error) override {
         const std::string name = NameBehindPrefix(prefixedName);
         const auto connection = IsSimulatorName(name) ? Connect(name) : std::nullopt;
-        if (connection && connection->usable) {
+        if (connection && connection->info.usable) {
             error = Errors::Success;
             return MakeUsbIpDevice(ConnectorTo(name), SimulatorBusId);
         }
@@ -140,7 +126,7 @@ class SimulatorsOfThisUser final : public UsbBus {
     }
     static bool IsUsableSimulator(const std::string& name) {
         const auto connection = Connect(name);
-        return connection && connection->usable;
+        return connection && connection->info.usable;
     }
 };
 
@@ -149,11 +135,12 @@ class SimulatorsOfThisUser final : public UsbBus {
 std::vector<SimulatorInfo> ListSimulators() {
     std::vector<SimulatorInfo> simulators;
     for (const std::string& name : ListeningSockets()) {
-        if (auto info = Describe(name)) {
-            if (info->usable) {
-                AskForUser(name, *info);
+        if (auto connection = Connect(name)) {
+            SimulatorInfo& info = simulators.emplace_back(std::move(connection->info));
+            connection.reset();
+            if (info.usable) {
+                AskForUser(name, info);
             }
-            simulators.push_back(std::move(*info));
         } else if (errno == EAGAIN) {
             SimulatorInfo& silent = simulators.emplace_back();
             silent.name = SimulatedPrefix + name;

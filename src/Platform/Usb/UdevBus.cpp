@@ -1,20 +1,19 @@
 #include "Platform/Usb/UdevBus.h"
 
 #include <libudev.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
+#include <chrono>
 #include <cstdint>
 #include <cstring>
-#include <ctime>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <memory>
 #include <mutex>
 #include <optional>
-#include <set>
 
 #include "Platform/Usb/LibUsbDevice.h"
 #include "Platform/Usb/ReleasedBy.h"
@@ -26,8 +25,7 @@ namespace {
 
 /// A file for each device that udev knows something about.
 constexpr const char* UdevDatabase = "/run/udev/data";
-constexpr std::int64_t NanosecondsPerSecond = 1'000'000'000;
-constexpr std::int64_t CoarsestTick = NanosecondsPerSecond / 20;
+constexpr std::chrono::milliseconds CoarsestTick(50);
 
 /// What is plugged into a port ("1-1.2") and its interfaces ("1-1.2:1.0"), not root hubs: a machine can have
 /// dozens of them, and udev walks through /sys for each that it looks at.
@@ -99,32 +97,31 @@ std::vector<UsbDeviceInfo> ListDevices(bool registeredOnly) {
     return devices;
 }
 
-/// From the descriptors that the kernel keeps.
-std::set<std::uint8_t> EndpointAddresses(const std::string& systemPath) {
-    std::ifstream file(systemPath + "/descriptors", std::ios::binary);
+/// Whether it has the instrument's endpoints, by the descriptors that the kernel keeps.
+bool HasEndpointsOfInstrument(const UsbDeviceInfo& device) {
+    std::ifstream file(device.systemPath + "/descriptors", std::ios::binary);
     const std::vector<std::uint8_t> bytes{std::istreambuf_iterator<char>(file), {}};
-    std::set<std::uint8_t> addresses;
-    for (const EndpointInfo& endpoint : EndpointsOfFirstInterface(bytes)) {
-        addresses.insert(endpoint.address);
-    }
-    return addresses;
+    const std::vector<EndpointInfo> endpoints = EndpointsOfFirstInterface(bytes);
+    constexpr std::array wanted{Protocol::BulkOutEndpoint, Protocol::BulkInEndpoint,
+                                Protocol::InterruptInEndpoint};
+    return std::ranges::all_of(wanted, [&endpoints](std::uint8_t address) {
+        return std::ranges::find(endpoints, address, &EndpointInfo::address) != endpoints.end();
+    });
 }
 
+using FileTime = std::filesystem::file_time_type;
+
 /// When udev last wrote about any device; nothing where that cannot be told.
-std::optional<std::int64_t> LastChangeOfUdev() {
-    struct stat folder {};
-    if (stat(UdevDatabase, &folder) != 0) {
-        return std::nullopt;
-    }
-    return folder.st_mtim.tv_sec * NanosecondsPerSecond + folder.st_mtim.tv_nsec;
+std::optional<FileTime> LastChangeOfUdev() {
+    std::error_code error;
+    const FileTime changed = std::filesystem::last_write_time(UdevDatabase, error);
+    return error ? std::nullopt : std::optional(changed);
 }
 
 /// Whether a later change is sure to get another time: file systems take theirs from a clock with coarse
 /// ticks.
-bool IsSettled(std::int64_t changed) {
-    timespec now{};
-    clock_gettime(CLOCK_REALTIME, &now);
-    return now.tv_sec * NanosecondsPerSecond + now.tv_nsec - changed > CoarsestTick;
+bool IsSettled(FileTime changed) {
+    return FileTime::clock::now() - changed > CoarsestTick;
 }
 
 /// Opening an instrument by its name asks some six times what is there: what udev says is kept until it says
@@ -152,7 +149,7 @@ class UdevBus final : public UsbBus {
   private:
     std::vector<UsbDeviceInfo> Present() {
         const std::lock_guard lock(mutex_);
-        const std::optional<std::int64_t> changed = LastChangeOfUdev();
+        const std::optional<FileTime> changed = LastChangeOfUdev();
         if (!keptSince_ || keptSince_ != changed) {
             kept_ = ListRegisteredDevices();
             keptSince_ = changed && IsSettled(*changed) ? changed : std::nullopt;
@@ -166,7 +163,7 @@ class UdevBus final : public UsbBus {
 
     std::mutex mutex_;  // guards what follows
     std::vector<UsbDeviceInfo> kept_;
-    std::optional<std::int64_t> keptSince_;
+    std::optional<FileTime> keptSince_;
 };
 
 }  // namespace
@@ -177,12 +174,7 @@ std::vector<UsbDeviceInfo> ListRegisteredDevices() {
 
 std::vector<UsbDeviceInfo> ListCandidateDevices() {
     std::vector<UsbDeviceInfo> devices = ListDevices(false);
-    std::erase_if(devices, [](const UsbDeviceInfo& device) {
-        const auto endpoints = EndpointAddresses(device.systemPath);
-        return !endpoints.contains(Protocol::BulkOutEndpoint) ||
-               !endpoints.contains(Protocol::BulkInEndpoint) ||
-               !endpoints.contains(Protocol::InterruptInEndpoint);
-    });
+    std::erase_if(devices, [](const UsbDeviceInfo& device) { return !HasEndpointsOfInstrument(device); });
     return devices;
 }
 

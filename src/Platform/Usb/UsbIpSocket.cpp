@@ -94,16 +94,17 @@ bool UsbIpSocket::Receive(std::span<std::uint8_t> bytes, bool inMessage) {
             bytes = bytes.subspan(count);
             continue;
         }
-        const bool direct = bytes.size() >= buffer_.size();
-        const ssize_t received = direct ? recv(file_.Get(), bytes.data(), bytes.size(), MSG_DONTWAIT)
-                                        : recv(file_.Get(), buffer_.data(), buffer_.size(), MSG_DONTWAIT);
+        // What does not fit any more is kept for later.
+        std::array parts{iovec{bytes.data(), bytes.size()}, iovec{buffer_.data(), buffer_.size()}};
+        msghdr message{};
+        message.msg_iov = parts.data();
+        message.msg_iovlen = parts.size();
+        const ssize_t received = recvmsg(file_.Get(), &message, MSG_DONTWAIT);
         if (received > 0) {
-            if (direct) {
-                bytes = bytes.subspan(static_cast<std::size_t>(received));
-            } else {
-                bufferStart_ = 0;
-                bufferEnd_ = static_cast<std::size_t>(received);
-            }
+            const std::size_t count = std::min(bytes.size(), static_cast<std::size_t>(received));
+            bytes = bytes.subspan(count);
+            bufferStart_ = 0;
+            bufferEnd_ = static_cast<std::size_t>(received) - count;
             if (LimitHasPassed()) {
                 return false;  // a peer that goes on sending would never let it be waited for
             }
