@@ -38,15 +38,7 @@ bool OverlappedRequest::Started(Handle startedOn, bool completedAtOnce) {
     return false;
 }
 
-bool OverlappedRequest::GetResult(std::uint32_t& transferred) {
-    return FetchResult(transferred, false);
-}
-
-bool OverlappedRequest::AwaitResult(std::uint32_t& transferred) {
-    return FetchResult(transferred, true);
-}
-
-bool OverlappedRequest::FetchResult(std::uint32_t& transferred, bool wait) {
+bool OverlappedRequest::GetResult(std::uint32_t& transferred, bool wait) {
     if (state_ == State::FailedToStart || state_ == State::Idle) {
         transferred = 0;
         SetLastError(state_ == State::Idle ? Errors::InvalidParameter : startError_);

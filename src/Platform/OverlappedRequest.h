@@ -25,10 +25,9 @@ class OverlappedRequest final {
     bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
                       void* output, std::uint32_t outputSize);
 
-    /// Result of the last start, without waiting. After a start that failed: that failure again.
-    bool GetResult(std::uint32_t& transferred);
-    /// The same, after waiting for the completion. The file's driver decides how long that may last.
-    bool AwaitResult(std::uint32_t& transferred);
+    /// Result of the last start; after a start that failed: that failure again. `wait` waits for the
+    /// completion, as long as the file's driver lets it last.
+    bool GetResult(std::uint32_t& transferred, bool wait = false);
 
     /// Cancels the transfer if it still runs, waits until it has completed, and gives the bytes it moved.
     /// `LastError` is left as it was.
@@ -41,7 +40,6 @@ class OverlappedRequest final {
     enum class State { Idle, Running, Completed, FailedToStart };
 
     bool Started(Handle startedOn, bool completedAtOnce);
-    bool FetchResult(std::uint32_t& transferred, bool wait);
 
     Overlapped record_;
     Handle file_ = NoHandle;

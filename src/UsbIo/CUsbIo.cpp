@@ -142,7 +142,7 @@ std::uint32_t CUsbIo::IoctlSync(std::uint32_t code, const void* input, std::uint
         if (status == Platform::Errors::IoPending) {
             status = Status::Success;
         }
-        if (status == Status::Success && !controlRequest_->AwaitResult(transferred)) {
+        if (status == Status::Success && !controlRequest_->GetResult(transferred, true)) {
             status = FailureCode();
         }
         if (controlRequest_->IsRunning()) {  // the wait was refused; the caller's buffers must be free again

@@ -74,7 +74,7 @@ DriverAnswer AskUsbIo(const std::string& path) {
         std::uint32_t moved = 0;
         Platform::OverlappedRequest request(event.Get());
         request.StartControl(file, Driver::Control::GetDriverInfo, nullptr, 0, bytes.data(), bytes.size());
-        if (request.AwaitResult(moved)) {
+        if (request.GetResult(moved, true)) {
             answer.version = UsbIo::DriverInfo::Decode(bytes).interfaceVersion;
         } else {
             answer.failure = Platform::LastError();
