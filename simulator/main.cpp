@@ -21,13 +21,13 @@
 #include "FreshEeprom.h"
 #include "KernelPort.h"
 #include "Platform/Linux/FileDescriptor.h"
-#include "Platform/Linux/StandardStreams.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/SimulatorBus.h"
 #include "PollLoop.h"
 #include "ProgramOptions.h"
 #include "SimulatedInstrument.h"
 #include "UsbIpServer.h"
+#include "Utilities/Files/Linux/StandardStreams.h"
 
 namespace {
 
@@ -181,7 +181,7 @@ void Run(const ProgramOptions& options) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    Varnholt::Platform::SecureStandardStreams();
+    Varnholt::Utilities::Files::SecureStandardStreams();
     ProgramOptions options;
     if (const std::optional<int> code = ReadOptions(argc, argv, options)) {
         return *code;

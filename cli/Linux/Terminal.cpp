@@ -14,7 +14,7 @@
 #include <thread>
 
 #include "ExitCode.h"
-#include "Platform/Linux/StandardStreams.h"
+#include "Utilities/Files/Linux/StandardStreams.h"
 
 namespace Varnholt::Cli {
 namespace {
@@ -67,7 +67,7 @@ sigset_t WatchedSignals() {
 }  // namespace
 
 void SecureStandardStreams() {
-    Platform::SecureStandardStreams();
+    Utilities::Files::SecureStandardStreams();
     static_cast<void>(::signal(SIGPIPE, SIG_IGN));
     static_cast<void>(::signal(SIGXFSZ, SIG_IGN));
 }

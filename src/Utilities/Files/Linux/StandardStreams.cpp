@@ -1,11 +1,11 @@
-#include "Platform/Linux/StandardStreams.h"
+#include "Utilities/Files/Linux/StandardStreams.h"
 
 #include <fcntl.h>
 #include <unistd.h>
 
 #include <initializer_list>
 
-namespace Varnholt::Platform {
+namespace Varnholt::Utilities::Files {
 
 void SecureStandardStreams() {
     for (const int stream : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) {
@@ -16,4 +16,4 @@ void SecureStandardStreams() {
     }
 }
 
-}  // namespace Varnholt::Platform
+}  // namespace Varnholt::Utilities::Files
