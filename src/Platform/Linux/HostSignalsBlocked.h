@@ -2,6 +2,8 @@
 
 #include <signal.h>
 
+#include <initializer_list>
+
 namespace Varnholt::Platform::Linux {
 
 /// Keeps the calling thread, and with it the threads that it starts meanwhile, from taking the signals that
@@ -10,8 +12,15 @@ namespace Varnholt::Platform::Linux {
 /// The end of the object gives the thread the mask that it had.
 class HostSignalsBlocked final {
   public:
-    HostSignalsBlocked();
-    ~HostSignalsBlocked();
+    HostSignalsBlocked() {
+        sigset_t blocked;
+        sigfillset(&blocked);
+        for (const int fault : {SIGSEGV, SIGBUS, SIGFPE, SIGILL, SIGTRAP, SIGABRT, SIGSYS}) {
+            sigdelset(&blocked, fault);
+        }
+        pthread_sigmask(SIG_SETMASK, &blocked, &before_);
+    }
+    ~HostSignalsBlocked() { pthread_sigmask(SIG_SETMASK, &before_, nullptr); }
     HostSignalsBlocked(const HostSignalsBlocked&) = delete;
     HostSignalsBlocked& operator=(const HostSignalsBlocked&) = delete;
 

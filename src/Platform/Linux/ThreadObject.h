@@ -13,15 +13,29 @@ namespace Varnholt::Platform::Linux {
 /// so.
 class ThreadObject final : public WaitableObject {
   public:
-    ~ThreadObject() override;
+    ~ThreadObject() override {
+        // The last reference is often the thread's own.
+        if (!joined_ && pthread_equal(thread, pthread_self())) {
+            pthread_detach(thread);
+        } else {
+            AfterWait();
+        }
+    }
 
-    Taken TryTake(ThreadRecord& taker) override;
-    ErrorCode Signal(ThreadRecord& signaller) override;
-    void AfterWait() override;
-    std::string Describe() const override;
+    Taken TryTake(ThreadRecord& /*taker*/) override { return ended_ ? Taken::Yes : Taken::No; }
+    ErrorCode Signal(ThreadRecord& /*signaller*/) override { return Errors::InvalidHandle; }
+    void AfterWait() final {
+        if (!joined_.exchange(true)) {
+            pthread_join(thread, nullptr);
+        }
+    }
+    std::string Describe() const override { return "the end of thread " + std::to_string(number); }
 
     /// Of the new thread itself, before it ends.
-    void End();
+    void End() {
+        ended_ = true;
+        OfferToWaiters();
+    }
 
     pthread_t thread{};
     std::uint32_t number = 0;
@@ -29,8 +43,6 @@ class ThreadObject final : public WaitableObject {
     void MustBeJoined() { joined_ = false; }
 
   private:
-    void JoinOnce();
-
     bool ended_ = false;  // guarded by the dispatcher lock
     std::atomic<bool> joined_ = true;
 };
