@@ -16,6 +16,8 @@ struct VersionRecord {
     std::string servicePack;
 };
 VersionRecord ReadVersionRecord();
+/// The same, whatever tests have put in its place.
+VersionRecord ReadSystemVersion();
 
 /// Asks whether this process runs as a 32-bit process on a 64-bit host; sets `flag` non-zero when it does.
 using Is64BitHostQuery = bool (*)(int& flag);

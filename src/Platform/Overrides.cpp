@@ -2,7 +2,6 @@
 #include <utility>
 
 #include "Platform/HostQueries.h"
-#include "Platform/SystemAnswers.h"
 #include "Platform/Time.h"
 
 namespace Varnholt::Platform {

@@ -25,6 +25,8 @@ CalendarTime LocalCalendarTime(std::int64_t seconds);
 
 /// Sounds the platform's beep, where there is one; waits for its end only where the platform does.
 void Beep(std::uint32_t hertz, std::uint32_t milliseconds);
+/// The same, whether tests listen or not.
+void SoundSystemBeep(std::uint32_t hertz, std::uint32_t milliseconds);
 
 /// Tests listen to the beeps instead of sounding them; an empty function gives the beep back to the system.
 /// The function is called on the beeping thread.

@@ -1,9 +1,9 @@
+#include "Platform/HostQueries.h"
+
 #include <sys/utsname.h>
 
 #include <cstdio>
 #include <string_view>
-
-#include "Platform/SystemAnswers.h"
 
 namespace Varnholt::Platform {
 namespace {

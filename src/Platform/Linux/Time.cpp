@@ -3,7 +3,6 @@
 #include <ctime>
 
 #include "Platform/Linux/Clock.h"
-#include "Platform/SystemAnswers.h"
 
 namespace Varnholt::Platform {
 namespace {

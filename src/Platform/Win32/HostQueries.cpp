@@ -1,4 +1,5 @@
-#include "Platform/SystemAnswers.h"
+#include "Platform/HostQueries.h"
+
 #include "Platform/Win32/Windows.h"
 
 namespace Varnholt::Platform {

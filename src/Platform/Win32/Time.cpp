@@ -1,6 +1,5 @@
 #include "Platform/Time.h"
 
-#include "Platform/SystemAnswers.h"
 #include "Platform/Win32/Windows.h"
 
 namespace Varnholt::Platform {
