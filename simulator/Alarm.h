@@ -1,10 +1,10 @@
 #pragma once
 
+#include <atomic>
 #include <cstdint>
 #include <functional>
 #include <limits>
-#include <mutex>
-#include <vector>
+#include <utility>
 
 #include "Platform/EventScheduler.h"
 
@@ -21,25 +21,38 @@ class Alarm final {
     Alarm(const Alarm&) = delete;
     Alarm& operator=(const Alarm&) = delete;
 
-    void RingNoLaterThan(std::uint64_t microseconds);
+    void RingNoLaterThan(std::uint64_t microseconds) {
+        std::uint64_t due = due_;
+        do {
+            if (due <= microseconds) {
+                return;
+            }
+        } while (!due_.compare_exchange_weak(due, microseconds));
+        try {
+            scheduler_.CallAt(
+                microseconds, [this] { Ring(); }, this);
+        } catch (...) {
+            due_ = Never;
+            throw;
+        }
+    }
     /// It does not ring any more once this has returned, unless it is called from inside the ringing.
-    void Clear();
+    void Clear() {
+        scheduler_.Forget(this);
+        due_ = Never;  // afterwards: a setting that was forgotten must not stand for one that will ring
+    }
 
   private:
-    struct Setting {
-        std::uint64_t number;
-        Platform::EventScheduler::EventId event;  // 0 while the scheduler is being called
-    };
     static constexpr std::uint64_t Never = std::numeric_limits<std::uint64_t>::max();
 
-    void Ring(std::uint64_t number);
+    void Ring() {
+        due_ = Never;
+        ring_();
+    }
 
     Platform::EventScheduler& scheduler_;
     const std::function<void()> ring_;
-    std::mutex mutex_;  // guards what follows
-    std::vector<Setting> waiting_;
-    std::uint64_t due_ = Never;  // of the last setting
-    std::uint64_t lastNumber_ = 0;
+    std::atomic<std::uint64_t> due_ = Never;  ///< the alarm is set for then, and perhaps for later times
 };
 
 }  // namespace Varnholt::Simulator

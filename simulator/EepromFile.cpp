@@ -12,7 +12,7 @@ EepromFile::EepromFile(PollLoop& pollLoop, std::string name, Log logger)
     : loop_(pollLoop), fileName_(std::move(name)), log_(std::move(logger)) {}
 
 EepromFile::~EepromFile() {
-    loop_.Forget(saving_);
+    loop_.Forget(this);
 }
 
 bool EepromFile::Exists() const {
@@ -32,21 +32,22 @@ void EepromFile::MemoryChanged() {
     // An image comes in many pieces.
     constexpr std::uint64_t delay = 100'000;
     unsaved_ = true;
-    if (saving_ == 0) {
-        saving_ = loop_.CallAt(loop_.Now() + delay, [this] { Save(); });
+    if (!std::exchange(savesSoon_, true)) {
+        loop_.CallAt(
+            loop_.Now() + delay, [this] { Save(); }, this);
     }
 }
 
 bool EepromFile::Finish() {
     if (unsaved_ && instrument_) {
-        loop_.Forget(saving_);
+        loop_.Forget(this);
         Save();
     }
     return !unsaved_;
 }
 
 void EepromFile::Save() {
-    saving_ = 0;
+    savesSoon_ = false;
     try {
         Utilities::Files::WriteFileAtomically(fileName_, instrument_->Eeprom());
         unsaved_ = false;

@@ -35,7 +35,7 @@ class EepromFile final {
     const std::string fileName_;
     const Log log_;
     std::shared_ptr<SimulatedInstrument> instrument_;
-    Platform::EventScheduler::EventId saving_ = 0;
+    bool savesSoon_ = false;
     bool unsaved_ = false;
 };
 

@@ -1,7 +1,6 @@
 #include "FaultInjector.h"
 
 #include <algorithm>
-#include <map>
 #include <mutex>
 #include <set>
 #include <utility>
@@ -53,13 +52,15 @@ class FaultInjector final : public Capture::InterceptingDevice {
           scheduler_(eventScheduler),
           unplug_(std::move(unplugDevice)),
           dataFaults_(*script_) {}
-    ~FaultInjector() override;
+    ~FaultInjector() override {
+        scheduler_.Forget(this);
+        Detach();
+    }
 
     ErrorCode Claim() override { return Gone() ? Errors::DeviceNotConnected : InterceptingDevice::Claim(); }
     ErrorCode ClearHalt(std::uint8_t endpoint) override;
 
   private:
-    using EventId = Platform::EventScheduler::EventId;
     using TransferPointer = std::shared_ptr<FaultyTransfer>;
 
     CopyPointer NewCopy() override { return std::make_shared<FaultyTransfer>(); }
@@ -75,7 +76,6 @@ class FaultInjector final : public Capture::InterceptingDevice {
     /// False when the transfer's end was asked for meanwhile, and it has ended.
     bool Hold(FaultyTransfer& transfer);
     void HoldFor(const TransferPointer& transfer, std::uint32_t milliseconds);
-    void ForgetAlarm(const FaultyTransfer& transfer);
     void TimeHasCome(const TransferPointer& transfer) noexcept;
     void ChangeOutcome(FaultyTransfer& transfer);
     void UnplugDevice(const FaultyTransfer* except = nullptr);
@@ -87,22 +87,9 @@ class FaultInjector final : public Capture::InterceptingDevice {
     DataFaults dataFaults_;
 
     std::mutex mutex_;  // guards what follows; not held while another object is called
-    std::map<const FaultyTransfer*, EventId> alarms_;
     std::set<std::uint8_t> halted_;
     bool gone_ = false;
 };
-
-FaultInjector::~FaultInjector() {
-    std::map<const FaultyTransfer*, EventId> waiting;
-    {
-        const std::lock_guard lock(mutex_);
-        waiting.swap(alarms_);
-    }
-    for (const auto& [transfer, alarm] : waiting) {
-        scheduler_.Forget(alarm);
-    }
-    Detach();
-}
 
 bool FaultInjector::Gone() {
     const std::lock_guard lock(mutex_);
@@ -230,47 +217,27 @@ bool FaultInjector::Hold(FaultyTransfer& transfer) {
 
 void FaultInjector::HoldFor(const TransferPointer& transfer, std::uint32_t milliseconds) {
     transfer->wasHeld = true;
-    {
-        const std::lock_guard lock(mutex_);
-        alarms_[transfer.get()] = 0;  // first what can fail: no alarm is left that nobody knows
+    if (Hold(*transfer)) {
+        const std::uint64_t end = scheduler_.Now() + std::uint64_t{milliseconds} * 1000;
+        scheduler_.CallAt(
+            end, [this, transfer] { TimeHasCome(transfer); }, this);
     }
-    EventId alarm = 0;
-    try {
-        if (!Hold(*transfer)) {
-            ForgetAlarm(*transfer);
-            return;
-        }
-        alarm = scheduler_.CallAt(scheduler_.Now() + std::uint64_t{milliseconds} * 1000,
-                                  [this, transfer] { TimeHasCome(transfer); });
-    } catch (...) {
-        ForgetAlarm(*transfer);
-        throw;
-    }
-    const std::lock_guard lock(mutex_);
-    if (const auto found = alarms_.find(transfer.get()); found != alarms_.end()) {
-        found->second = alarm;
-    }
-}
-
-void FaultInjector::ForgetAlarm(const FaultyTransfer& transfer) {
-    const std::lock_guard lock(mutex_);
-    alarms_.erase(&transfer);
 }
 
 void FaultInjector::TimeHasCome(const TransferPointer& transfer) noexcept {
-    if (IsUnderWay(*transfer)) {
-        ErrorCode code = Errors::Success;
-        try {
-            code = Begin(transfer);
-        } catch (...) {  // no memory
-            code = Errors::NotEnoughMemory;
-        }
-        if (code != Errors::Success) {
-            End(*transfer,
-                code == Errors::DeviceNotConnected ? TransferStatus::DeviceGone : TransferStatus::IoError, 0);
-        }
+    if (!IsUnderWay(*transfer)) {
+        return;
     }
-    ForgetAlarm(*transfer);  // known until now, so that the destructor waits for the end of this call
+    ErrorCode code = Errors::Success;
+    try {
+        code = Begin(transfer);
+    } catch (...) {  // no memory
+        code = Errors::NotEnoughMemory;
+    }
+    if (code != Errors::Success) {
+        End(*transfer,
+            code == Errors::DeviceNotConnected ? TransferStatus::DeviceGone : TransferStatus::IoError, 0);
+    }
 }
 
 ErrorCode FaultInjector::ClearHalt(std::uint8_t endpoint) {

@@ -14,13 +14,13 @@ std::uint64_t PollLoop::Now() {
         std::chrono::duration_cast<std::chrono::microseconds>(sinceStart).count());
 }
 
-PollLoop::EventId PollLoop::CallAt(std::uint64_t time, std::function<void()> event) {
-    waiting_.emplace(std::pair(time, ++lastId_), std::move(event));
-    return lastId_;
+void PollLoop::CallAt(std::uint64_t time, std::function<void()> event, const void* owner) {
+    waiting_.emplace(time, Platform::ScheduledEvent{std::move(event), owner});
 }
 
-void PollLoop::Forget(EventId id) {
-    std::erase_if(waiting_, [id](const auto& entry) { return entry.first.second == id; });
+void PollLoop::Forget(const void* owner) {
+    Platform::ScheduledEvents dropped;
+    TakeEventsOf(owner, waiting_, dropped);
 }
 
 void PollLoop::Watch(int file, short events, std::function<void()> handler) {
@@ -29,10 +29,8 @@ void PollLoop::Watch(int file, short events, std::function<void()> handler) {
 
 void PollLoop::CallDueEvents() {
     const std::uint64_t now = Now();
-    while (!stopped_ && !waiting_.empty() && waiting_.begin()->first.first <= now) {
-        const std::function<void()> event = std::move(waiting_.begin()->second);
-        waiting_.erase(waiting_.begin());
-        event();
+    while (!stopped_ && !waiting_.empty() && waiting_.begin()->first <= now) {
+        waiting_.extract(waiting_.begin()).mapped().call();
     }
 }
 
@@ -42,7 +40,7 @@ int PollLoop::MillisecondsToNextEvent() {
         return -1;
     }
     const std::uint64_t now = Now();
-    const std::uint64_t time = waiting_.begin()->first.first;
+    const std::uint64_t time = waiting_.begin()->first;
     return time <= now ? 0 : static_cast<int>(std::min((time - now + 999) / 1000, longest));
 }
 

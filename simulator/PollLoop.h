@@ -15,10 +15,10 @@ namespace Varnholt::Simulator {
 class PollLoop : public Platform::EventScheduler {
   public:
     std::uint64_t Now() override;
-    EventId CallAt(std::uint64_t time, std::function<void()> event) override;
-    void Forget(EventId id) override;
+    void CallAt(std::uint64_t time, std::function<void()> event, const void* owner = nullptr) override;
+    void Forget(const void* owner) override;
     /// As soon as what is being called now has returned.
-    EventId CallSoon(std::function<void()> event) { return CallAt(0, std::move(event)); }
+    void CallSoon(std::function<void()> event, const void* owner) { CallAt(0, std::move(event), owner); }
 
     /// Calls `handler` whenever the file is ready for one of `events` (as for poll), or broken. Replaces an
     /// earlier watch of the file.
@@ -39,8 +39,7 @@ class PollLoop : public Platform::EventScheduler {
     int MillisecondsToNextEvent();
 
     std::map<int, WatchedFile> watches_;
-    std::map<std::pair<std::uint64_t, EventId>, std::function<void()>> waiting_;
-    EventId lastId_ = 0;
+    Platform::ScheduledEvents waiting_;
     bool stopped_ = false;
 };
 

@@ -10,10 +10,10 @@ namespace Varnholt::Simulator {
 class SchedulerInForce final : public Platform::EventScheduler {
   public:
     std::uint64_t Now() override { return Platform::ClockScheduler().Now(); }
-    EventId CallAt(std::uint64_t time, std::function<void()> event) override {
-        return Platform::ClockScheduler().CallAt(time, std::move(event));
+    void CallAt(std::uint64_t time, std::function<void()> event, const void* owner) override {
+        Platform::ClockScheduler().CallAt(time, std::move(event), owner);
     }
-    void Forget(EventId id) override { Platform::ClockScheduler().Forget(id); }
+    void Forget(const void* owner) override { Platform::ClockScheduler().Forget(owner); }
 };
 
 }  // namespace Varnholt::Simulator

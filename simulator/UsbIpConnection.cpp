@@ -52,14 +52,15 @@ void UsbIpConnection::Watch() {
         watchedFor_ = events;
         loop_.Watch(file_.Get(), events, [this] { Ready(); });
     }
-    if (deadline_ == 0 && session_->PeerIsDue()) {
+    if (!checksPeer_ && session_->PeerIsDue()) {
         CheckPeerAt(loop_.Now() + Patience);
     }
 }
 
 void UsbIpConnection::CheckPeerAt(std::uint64_t time) {
-    deadline_ = loop_.CallAt(time, [this] {
-        deadline_ = 0;
+    checksPeer_ = true;
+    const auto check = [this] {
+        checksPeer_ = false;
         if (!session_->PeerIsDue()) {
             return;
         }
@@ -68,16 +69,19 @@ void UsbIpConnection::CheckPeerAt(std::uint64_t time) {
             return;
         }
         End("silent for too long");
-    });
+    };
+    loop_.CallAt(time, check, this);
 }
 
 /// Not from inside the session, which is busy.
 void UsbIpConnection::FlushSoon() {
-    if (flush_ == 0 && !ended_) {
-        flush_ = loop_.CallSoon([this] {
-            flush_ = 0;
+    if (!flushesSoon_ && !ended_) {
+        flushesSoon_ = true;
+        const auto flush = [this] {
+            flushesSoon_ = false;
             Flush();
-        });
+        };
+        loop_.CallSoon(flush, this);
     }
 }
 
@@ -127,8 +131,7 @@ bool UsbIpConnection::SendOutput() {
 
 void UsbIpConnection::StopListening() {
     ended_ = true;
-    loop_.Forget(flush_);
-    loop_.Forget(deadline_);
+    loop_.Forget(this);
     loop_.Unwatch(file_.Get());
 }
 

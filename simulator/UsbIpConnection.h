@@ -52,8 +52,8 @@ class UsbIpConnection final {
     std::array<std::uint8_t, 65536> input_{};
     std::size_t inputStart_ = 0;
     std::size_t inputEnd_ = 0;
-    Platform::EventScheduler::EventId flush_ = 0;
-    Platform::EventScheduler::EventId deadline_ = 0;
+    bool flushesSoon_ = false;
+    bool checksPeer_ = false;
     std::uint64_t lastMoved_ = 0;  // when bytes went either way
     short watchedFor_ = -1;
     bool ended_ = false;

@@ -142,8 +142,7 @@ class UsbIpServer::Exports final : public UsbIpExports {
 UsbIpServer::UsbIpServer(PollLoop& pollLoop, Log logger) : loop_(pollLoop), log_(std::move(logger)) {}
 
 UsbIpServer::~UsbIpServer() {
-    loop_.Forget(cleaning_);
-    loop_.Forget(relistening_);
+    loop_.Forget(this);
     removed_.clear();
     connections_.clear();
     for (const Listener& listener : listeners_) {
@@ -232,8 +231,8 @@ void UsbIpServer::PauseListening() {
     for (const Listener& listener : listeners_) {
         loop_.Unwatch(listener.file.Get());
     }
-    loop_.Forget(relistening_);
-    relistening_ = loop_.CallAt(loop_.Now() + pause, [this] { Listen(); });
+    loop_.CallAt(
+        loop_.Now() + pause, [this] { Listen(); }, this);
 }
 
 void UsbIpServer::Accept(const Listener& listener) {
@@ -290,12 +289,7 @@ void UsbIpServer::Remove(UsbIpConnection& connection) {
     const auto found =
         std::ranges::find_if(connections_, [&](const auto& each) { return each.get() == &connection; });
     removed_.splice(removed_.end(), connections_, found);
-    if (cleaning_ == 0) {
-        cleaning_ = loop_.CallSoon([this] {
-            cleaning_ = 0;
-            removed_.clear();
-        });
-    }
+    loop_.CallSoon([this] { removed_.clear(); }, this);
 }
 
 }  // namespace Varnholt::Simulator

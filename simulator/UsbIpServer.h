@@ -76,8 +76,6 @@ class UsbIpServer final {
     std::list<Listener> listeners_;
     std::list<std::unique_ptr<UsbIpConnection>> connections_;
     std::list<std::unique_ptr<UsbIpConnection>> removed_;
-    Platform::EventScheduler::EventId cleaning_ = 0;
-    Platform::EventScheduler::EventId relistening_ = 0;
 };
 
 }  // namespace Varnholt::Simulator

@@ -1,7 +1,6 @@
 #include "Platform/RealScheduler.h"
 
 #include <algorithm>
-#include <atomic>
 #include <chrono>
 #include <exception>
 
@@ -16,13 +15,17 @@ constexpr std::uint64_t LongestStep = 3'600'000'000;
 
 }  // namespace
 
-EventScheduler::EventId NewEventId() {
-    static std::atomic<EventScheduler::EventId> last = 0;
-    return ++last;
+void TakeEventsOf(const void* owner, ScheduledEvents& events, ScheduledEvents& taken) {
+    for (auto next = events.begin(); next != events.end();) {
+        const auto event = next++;
+        if (event->second.owner == owner) {
+            taken.insert(events.extract(event));
+        }
+    }
 }
 
 RealScheduler::~RealScheduler() {
-    decltype(events_) dropped;  // goes without the lock
+    ScheduledEvents dropped;  // ends without the lock
     Hold hold(lock_);
     dropped.swap(events_);
     WaitForEnd(hold);
@@ -33,11 +36,10 @@ std::uint64_t RealScheduler::Now() {
     return static_cast<std::uint64_t>(std::chrono::floor<microseconds>(sinceStart).count());
 }
 
-EventScheduler::EventId RealScheduler::CallAt(std::uint64_t time, std::function<void()> event) {
-    const EventId id = NewEventId();
+void RealScheduler::CallAt(std::uint64_t time, std::function<void()> event, const void* owner) {
     Hold hold(lock_);
     JoinEndedThread(hold);
-    const auto place = events_.emplace(std::pair(time, id), std::move(event)).first;
+    const auto place = events_.emplace(time, ScheduledEvent{std::move(event), owner});
     if (!thread_.joinable()) {
         try {
             thread_ = startThread_([this] { CallEvents(); });
@@ -50,23 +52,20 @@ EventScheduler::EventId RealScheduler::CallAt(std::uint64_t time, std::function<
         changed_.notify_one();
     }
     callEnded_.notify_all();  // the end of the thread is not to be waited for any more
-    return id;
 }
 
-void RealScheduler::Forget(EventId id) {
-    std::function<void()> dropped;  // what it holds may be anything: it goes without the lock
+void RealScheduler::Forget(const void* owner) {
+    ScheduledEvents dropped;
     Hold hold(lock_);
-    const auto found =
-        std::ranges::find_if(events_, [id](const auto& waiting) { return waiting.first.second == id; });
-    if (found != events_.end()) {
-        dropped = std::move(found->second);
-        events_.erase(found);
-    }
-    if (running_ != 0 && runner_ == std::this_thread::get_id()) {
+    TakeEventsOf(owner, events_, dropped);
+    if (isCalling_ && thread_.get_id() == std::this_thread::get_id()) {
         return;  // from inside an event
     }
-    callEnded_.wait(hold, [this, id] { return running_ != id; });
-    if (events_.empty() && running_ == 0) {
+    while (isCalling_ && ownerOfCall_ == owner) {
+        callEnded_.wait(hold);
+        TakeEventsOf(owner, events_, dropped);
+    }
+    if (events_.empty() && !isCalling_) {
         WaitForEnd(hold);
     }
 }
@@ -75,7 +74,7 @@ void RealScheduler::CallEvents() {
     Hold hold(lock_);
     while (!events_.empty()) {
         const std::uint64_t now = Now();
-        const std::uint64_t time = events_.begin()->first.first;
+        const std::uint64_t time = events_.begin()->first;
         if (time > now) {
             // A time so far off that the system's clock could not hold it is approached in steps.
             changed_.wait_until(hold,
@@ -89,16 +88,14 @@ void RealScheduler::CallEvents() {
 }
 
 void RealScheduler::CallNext(Hold& hold) {
-    const auto next = events_.begin();
-    running_ = next->first.second;
-    runner_ = std::this_thread::get_id();
-    std::function<void()> event = std::move(next->second);
-    events_.erase(next);
+    ScheduledEvent event = std::move(events_.extract(events_.begin()).mapped());
+    isCalling_ = true;
+    ownerOfCall_ = event.owner;
     hold.unlock();
-    event();
-    event = nullptr;
+    event.call();
+    event.call = nullptr;
     hold.lock();
-    running_ = 0;
+    isCalling_ = false;
     callEnded_.notify_all();
 }
 

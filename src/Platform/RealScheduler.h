@@ -1,17 +1,12 @@
 #pragma once
 
 #include <condition_variable>
-#include <map>
 #include <mutex>
 #include <thread>
-#include <utility>
 
 #include "Platform/EventScheduler.h"
 
 namespace Varnholt::Platform {
-
-/// Names events across all schedulers, so that an event of one is never taken for an event of another.
-EventScheduler::EventId NewEventId();
 
 /// Events in real time, called on a thread that exists while events wait. It stands on the language's own
 /// threads: faults that a test places in the platform's calls must not hit a simulated device as well.
@@ -27,8 +22,8 @@ class RealScheduler final : public EventScheduler {
     RealScheduler& operator=(const RealScheduler&) = delete;
 
     std::uint64_t Now() override;
-    EventId CallAt(std::uint64_t time, std::function<void()> event) override;
-    void Forget(EventId id) override;
+    void CallAt(std::uint64_t time, std::function<void()> event, const void* owner) override;
+    void Forget(const void* owner) override;
 
   private:
     using Hold = std::unique_lock<std::mutex>;
@@ -39,9 +34,9 @@ class RealScheduler final : public EventScheduler {
 
     const Starter startThread_;
     std::mutex lock_;  // of everything below; nothing else is locked while it is held
-    std::map<std::pair<std::uint64_t, EventId>, std::function<void()>> events_;
-    EventId running_ = 0;
-    std::thread::id runner_;             // of the event that is running
+    ScheduledEvents events_;
+    bool isCalling_ = false;
+    const void* ownerOfCall_ = nullptr;
     std::condition_variable callEnded_;  // an event's, or the thread's
     std::condition_variable changed_;    // for the thread
     std::thread thread_;

@@ -87,7 +87,7 @@ class RecursiveMutex final {
 
   private:
     struct Impl;
-    InPlace<Impl, 80> impl_;
+    InPlace<Impl, 104> impl_;
 };
 
 }  // namespace Varnholt::Platform

@@ -139,9 +139,9 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
         WriteFile(folder_.Path("csv"), {1});
         Service::Interruption interruption;
         tool_.interruption = &interruption;
-        const auto event = After(interruptedAt, [&] { interruption.Request(); });
+        After(interruptedAt, [&] { interruption.Request(); });
         Fail(std::string("readout --csv --repeat ") + repeat + " --interval 1 --output @csv", code, text);
-        Platform::ClockScheduler().Forget(event);
+        ForgetEvents();
         const bool isReplaced = code == ExitCode::Success && lines > 0;
         const std::string kept = folder_.Path(isReplaced ? "csv" : "csv.part");
         const auto content = lines > 0 ? ReadFile(kept) : std::vector<std::uint8_t>();
@@ -192,10 +192,10 @@ TEST_P(InstrumentCommandsTest, OutputThatCannotBeWrittenEndsACommandAtOnce) {
     tool_.CloseOut();
     for (const char* command : {"readout --csv --repeat 60 --interval 1", "monitor --for 60", "scan"}) {
         const Stopwatch watch(clock_);
-        const auto event = After(500'000, [&] { instrument.PressButton(); });
+        After(500'000, [&] { instrument.PressButton(); });
         Fail(command, ExitCode::File, "the output cannot be written");
         watch.ExpectAtMost(5000);
-        Platform::ClockScheduler().Forget(event);
+        ForgetEvents();
     }
 }
 

@@ -134,14 +134,14 @@ TEST_P(ScanTest, WhatCameIsKept) {
             SetFaults(faults);
             Service::Interruption interruption;
             tool_.interruption = &interruption;
-            const auto ending = After(5'000'000, [&, event = event] { event(interruption); });
+            After(5'000'000, [&, event = event] { event(interruption); });
             const Stopwatch watch(clock_);
             Fail(std::string("scan --raw --json --timeout 2 --output @raw") +
                      (how == "discarded" ? " --discard" : "") +
                      (how != "open-ended" ? " --records 25000" : ""),
                  code, text);
             watch.ExpectAtMost(code == ExitCode::Interrupted ? 5'100 : 25'000);
-            Platform::ClockScheduler().Forget(ending);
+            ForgetEvents();
             EXPECT_EQ(tool_.Json()["ended"], ended);
 
             const bool isKept = hasRecords && how != "discarded";
@@ -177,10 +177,10 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
         SCOPED_TRACE(after);
         Service::Interruption interruption;
         tool_.interruption = &interruption;
-        const auto event = After(after * 1000, [&] { interruption.Request(); });
+        After(after * 1000, [&] { interruption.Request(); });
         const Stopwatch watch(clock_);
         const ExitCode code = tool_.Run("scan --raw --output @raw");
-        Platform::ClockScheduler().Forget(event);
+        ForgetEvents();
         watch.ExpectAtMost(code == ExitCode::Interrupted ? after + 50 : 8'000);
         EXPECT_TRUE(code == ExitCode::Interrupted || code == ExitCode::Success) << tool_.Err();
         interrupted += code == ExitCode::Interrupted ? 1 : 0;

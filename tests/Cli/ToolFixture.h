@@ -83,10 +83,11 @@ class ToolTest : public testing::TestWithParam<Transport> {
         host_.Bus().SetFaults("sim", Simulator::FaultPlan::Parse(plan));
     }
     /// Has something happen, so many microseconds from now.
-    static Platform::EventScheduler::EventId After(std::uint64_t microseconds, std::function<void()> event) {
+    void After(std::uint64_t microseconds, std::function<void()> event) {
         auto& scheduler = Platform::ClockScheduler();
-        return scheduler.CallAt(scheduler.Now() + microseconds, std::move(event));
+        scheduler.CallAt(scheduler.Now() + microseconds, std::move(event), this);
     }
+    void ForgetEvents() { Platform::ClockScheduler().Forget(this); }
     static Simulator::MeasureParameters ParametersOf(Simulator::SimulatedInstrument& instrument) {
         return instrument.WithCommands([](const auto& commands) { return commands.parameters; });
     }

@@ -46,20 +46,25 @@ TEST_P(Schedulers, ForgetEvents) {
     const OwnedHandle done(MakeAutoResetEvent());
     std::atomic<int> called = 0;
     const auto held = std::make_shared<int>();
-    const auto forgotten = scheduler.CallAt(start + 60'000'000, [&called, held] { ++called; });
+    const int forgotten = 0;
+    scheduler.CallAt(
+        start + 60'000'000, [&called, held] { ++called; }, &forgotten);
+    scheduler.CallAt(
+        start + 70'000'000, [&called, held] { ++called; }, &forgotten);
     SleepMilliseconds(5);  // what comes now is due before that for which a thread waits
-    std::atomic<EventScheduler::EventId> own = 0;  // a busy machine calls the event before that is known
-    own = scheduler.CallAt(start + 10'000, [&] {
-        scheduler.Forget(own);
+    const int own = 0;
+    const auto forgetItself = [&] {
+        scheduler.CallAt(
+            start + 60'000'000, [&called] { ++called; }, &own);
+        scheduler.Forget(&own);
         SignalEvent(done.Get());
-    });
-    EXPECT_NE(forgotten, 0u);
-    EXPECT_NE(forgotten, own);
-    scheduler.Forget(forgotten);
+    };
+    scheduler.CallAt(start + 10'000, forgetItself, &own);
+    scheduler.Forget(&forgotten);
     EXPECT_EQ(held.use_count(), 1) << "what is forgotten holds nothing any more";
     EXPECT_EQ(Wait(done.Get(), LongTimeout), WaitResult::Signalled);
-    scheduler.Forget(own);
-    scheduler.Forget(forgotten);
+    scheduler.Forget(&own);
+    scheduler.Forget(&forgotten);
     EXPECT_EQ(called, 0);
 }
 
@@ -67,14 +72,18 @@ TEST_P(Schedulers, ForgetReturnsAfterACallThatIsRunning) {
     EventScheduler& scheduler = ClockScheduler();
     const OwnedHandle running(MakeAutoResetEvent());
     std::atomic<bool> over = false;
-    const auto id = scheduler.CallAt(scheduler.Now(), [&] {
+    const auto event = [&] {
         SignalEvent(running.Get());
         SleepMilliseconds(30);
+        // Whoever forgets the owner meanwhile is not to meet this one, either.
+        scheduler.CallAt(
+            scheduler.Now() + 1'000'000, [] { ADD_FAILURE(); }, &over);
         over = true;
-    });
+    };
+    scheduler.CallAt(scheduler.Now(), event, &over);
     TestThread other([&] {
         EXPECT_EQ(Wait(running.Get(), LongTimeout), WaitResult::Signalled);
-        scheduler.Forget(id);
+        scheduler.Forget(&over);
         EXPECT_TRUE(over);
     });
 }
@@ -91,7 +100,9 @@ TEST_P(Schedulers, CallEveryEventOnce) {
                 ++called;
                 ReleaseSemaphore(all.Get(), 1);
             });
-            scheduler.Forget(scheduler.CallAt(scheduler.Now() + 10'000'000, [] { ADD_FAILURE(); }));
+            scheduler.CallAt(
+                scheduler.Now() + 10'000'000, [] { ADD_FAILURE(); }, &i);
+            scheduler.Forget(&i);
         }
     };
     {

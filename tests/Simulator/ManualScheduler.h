@@ -1,7 +1,6 @@
 #pragma once
 
 #include <functional>
-#include <map>
 #include <utility>
 
 #include "Platform/EventScheduler.h"
@@ -12,22 +11,18 @@ namespace Varnholt::Simulator {
 class ManualScheduler : public Platform::EventScheduler {
   public:
     std::uint64_t Now() override { return now_; }
-    EventId CallAt(std::uint64_t time, std::function<void()> event) override {
-        waiting_.emplace(std::pair(time, ++lastId_), std::move(event));
-        return lastId_;
+    void CallAt(std::uint64_t time, std::function<void()> event, const void* owner = nullptr) override {
+        waiting_.emplace(time, Platform::ScheduledEvent{std::move(event), owner});
     }
-    void Forget(EventId id) override {
-        std::erase_if(waiting_, [id](const auto& entry) { return entry.first.second == id; });
+    void Forget(const void* owner) override {
+        std::erase_if(waiting_, [owner](const auto& entry) { return entry.second.owner == owner; });
     }
 
     void Advance(std::uint64_t microseconds) {
         const std::uint64_t end = now_ + microseconds;
-        while (!waiting_.empty() && waiting_.begin()->first.first <= end) {
-            const auto first = waiting_.begin();
-            now_ = std::max(now_, first->first.first);
-            const std::function<void()> event = std::move(first->second);
-            waiting_.erase(first);
-            event();
+        while (!waiting_.empty() && waiting_.begin()->first <= end) {
+            now_ = std::max(now_, waiting_.begin()->first);
+            waiting_.extract(waiting_.begin()).mapped().call();
         }
         now_ = end;
     }
@@ -35,8 +30,7 @@ class ManualScheduler : public Platform::EventScheduler {
 
   private:
     std::uint64_t now_ = 1'000'000;
-    EventId lastId_ = 0;
-    std::map<std::pair<std::uint64_t, EventId>, std::function<void()>> waiting_;
+    Platform::ScheduledEvents waiting_;
 };
 
 }  // namespace Varnholt::Simulator

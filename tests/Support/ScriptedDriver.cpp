@@ -52,9 +52,7 @@ Answer UsualAnswer(std::uint32_t code, std::uint32_t room) {
 ScriptedDriver::ScriptedDriver(std::vector<std::string> devicePaths) : paths_(std::move(devicePaths)) {}
 
 ScriptedDriver::~ScriptedDriver() {
-    for (const EventScheduler::EventId event : events_) {
-        ClockScheduler().Forget(event);
-    }
+    ClockScheduler().Forget(this);
 }
 
 void ScriptedDriver::Script(std::uint32_t place, Answer answer) {
@@ -263,11 +261,8 @@ bool ScriptedDriver::Start(const File& file, std::uint32_t code, std::string lin
 
 void ScriptedDriver::EndLater(std::uint64_t number, std::uint64_t microseconds, ErrorCode code,
                               bool withData) {
-    const EventScheduler::EventId event =
-        ClockScheduler().CallAt(ClockScheduler().Now() + microseconds,
-                                [this, number, code, withData] { End(number, code, withData); });
-    const std::lock_guard held(lock_);
-    events_.push_back(event);
+    const auto end = [this, number, code, withData] { End(number, code, withData); };
+    ClockScheduler().CallAt(ClockScheduler().Now() + microseconds, end, this);
 }
 
 void ScriptedDriver::End(std::uint64_t number, ErrorCode code, bool withData) {

@@ -125,7 +125,6 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     std::map<std::uint32_t, std::deque<Answer>> scripts_;
     std::map<std::string, std::function<Platform::ErrorCode()>> openActions_;
     std::vector<std::string> transcript_;
-    std::vector<Platform::EventScheduler::EventId> events_;
     std::map<std::uint32_t, std::uint64_t> bytesIn_;
     std::uint64_t lastNumber_ = 0;
 };

@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "Platform/Drivers/RecordState.h"
+#include "Platform/EventScheduler.h"
 
 namespace Varnholt::Platform::Drivers {
 namespace {
@@ -135,12 +136,14 @@ void OpenFile::LimitTime(RunningRequest& request) {
         return;
     }
     EventScheduler& scheduler = ClockScheduler();
+    // The request is there when this is called: its end forgets the alarm before anything else.
+    const auto giveUp = [&request] {
+        const std::shared_ptr<RunningRequest> late = request.shared_from_this();
+        late->file->GiveUp(*late);
+    };
     try {
-        // The request is there when this is called: its end forgets the alarm before anything else.
-        request.alarm = scheduler.CallAt(scheduler.Now() + std::uint64_t{limit} * 1000, [&request] {
-            const std::shared_ptr<RunningRequest> late = request.shared_from_this();
-            late->file->GiveUp(*late);
-        });
+        scheduler.CallAt(scheduler.Now() + std::uint64_t{limit} * 1000, giveUp, &request);
+        request.hasAlarm = true;
     } catch (...) {
         // No memory for the alarm: the transfer goes on without one.
     }
@@ -163,7 +166,7 @@ void OpenFile::CancelAfterSubmit(RunningRequest& request) {
     } else {
         driver_->Device().Cancel(request.transfer);
     }
-    EndCancelling();
+    Leave([this] { --cancelling_; });
 }
 
 ErrorCode OpenFile::Finish(RunningRequest& request) {
@@ -179,31 +182,27 @@ ErrorCode OpenFile::Finish(RunningRequest& request) {
 }
 
 void OpenFile::Retire(RunningRequest& request) {
-    if (request.alarm != 0) {
-        ClockScheduler().Forget(std::exchange(request.alarm, 0));
+    if (request.hasAlarm) {
+        ClockScheduler().Forget(&request);
     }
     std::shared_ptr<RunningRequest> retired;
-    bool isIdle = false;
-    {
-        const std::lock_guard guard(lock_);
+    Leave([&] {
         const auto place = std::ranges::find(running_, &request, &std::shared_ptr<RunningRequest>::get);
         retired = std::move(*place);
         running_.erase(place);
-        isIdle = closing_ && IsIdle();
-    }
+    });
     if (retired->isAwaited) {
         retired->ended.Signal();
     }
-    if (isIdle) {
-        idle_.Signal();
-    }
 }
 
-void OpenFile::EndCancelling() {
+/// Takes something off what keeps the file busy; `Close` goes on when that was the last of it.
+template <class Change>
+void OpenFile::Leave(Change change) {
     bool isIdle = false;
     {
         const std::lock_guard guard(lock_);
-        --cancelling_;
+        change();
         isIdle = closing_ && IsIdle();
     }
     if (isIdle) {
@@ -241,7 +240,7 @@ void OpenFile::Cancel(Matches matches, std::uint32_t reason) {
         if (isSubmitted) {
             driver_->Device().Cancel(chosen->transfer);
         }
-        EndCancelling();
+        Leave([this] { --cancelling_; });
     }
 }
 

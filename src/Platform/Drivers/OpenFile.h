@@ -58,7 +58,8 @@ class OpenFile final : public std::enable_shared_from_this<OpenFile> {
     void GiveUp(const RunningRequest& request);
     template <class Matches>
     void Cancel(Matches matches, std::uint32_t reason = RunningRequest::CancelWanted);
-    void EndCancelling();
+    template <class Change>
+    void Leave(Change change);
     std::shared_ptr<RunningRequest> FindAwaited(const Overlapped& record);
     bool IsIdle() const { return running_.empty() && cancelling_ == 0; }
 

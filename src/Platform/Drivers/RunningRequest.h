@@ -6,7 +6,6 @@
 #include <thread>
 
 #include "Platform/DeviceFiles.h"
-#include "Platform/EventScheduler.h"
 #include "Platform/Usb/UsbDevice.h"
 #include "Platform/WaitableObjects.h"
 
@@ -51,8 +50,7 @@ struct RunningRequest final : public Usb::TransferClient,
     std::atomic<std::uint16_t> endpoint{Undecided};
     /// Milliseconds that a wait for the request lasts before the driver gives it up; 0: no limit.
     std::atomic<std::uint32_t> waitLimit{0};
-    /// Gives up a request that is waited for elsewhere; 0: none.
-    EventScheduler::EventId alarm = 0;
+    bool hasAlarm = false;   ///< an event, owned by the request, gives it up: it is waited for elsewhere
     bool isAwaited = false;  ///< guarded by the file's lock
     EmbeddedEvent ended;     ///< signalled if it is awaited
 };

@@ -83,16 +83,16 @@ class Clock {
                                      Microseconds period, WaitableObject* only, std::uint32_t seen) = 0;
 
     /// A platform call begins or has woken somebody: another thread may go first.
-    virtual void Preempt(DispatcherLock& hold) = 0;
+    virtual void Preempt(DispatcherLock& /*hold*/) {}
     /// The caller gives up the rest of its time slice.
     virtual void GiveUpSlice(DispatcherLock& hold) = 0;
 
     /// The life of a thread of `StartThread`. The first is called by its maker and may be undone by the last;
     /// the others by the thread itself.
-    virtual void ThreadMade(DispatcherLock& hold, ThreadRecord& thread) = 0;
-    virtual void ThreadBegins(DispatcherLock& hold, ThreadRecord& thread) = 0;
-    virtual void ThreadEnds(DispatcherLock& hold, ThreadRecord& thread) = 0;
-    virtual void ThreadNeverBegan(DispatcherLock& hold, ThreadRecord& thread) = 0;
+    virtual void ThreadMade(DispatcherLock& /*hold*/, ThreadRecord& /*thread*/) {}
+    virtual void ThreadBegins(DispatcherLock& /*hold*/, ThreadRecord& /*thread*/) {}
+    virtual void ThreadEnds(DispatcherLock& /*hold*/, ThreadRecord& /*thread*/) {}
+    virtual void ThreadNeverBegan(DispatcherLock& /*hold*/, ThreadRecord& /*thread*/) {}
 };
 
 /// The clock in force.

@@ -8,8 +8,6 @@
 
 #include "Platform/Linux/MutexObject.h"
 #include "Platform/Linux/NoDestructor.h"
-#include "Platform/Linux/RealClock.h"
-#include "Platform/WaitableObjects.h"
 
 namespace Varnholt::Platform::Linux {
 namespace {
@@ -32,7 +30,6 @@ struct Wakeup {
 };
 NoDestructor<Wakeup> deferredWakeup;
 
-std::atomic<Clock*> installedClock = nullptr;
 std::atomic<std::uint32_t> threadCount = 0;
 
 thread_local ThreadRecord* currentThread = nullptr;
@@ -137,19 +134,6 @@ void AbandonOwned(ThreadRecord& thread) {
     for (const auto& mutex : abandoned) {
         mutex->Abandon();
     }
-}
-
-Clock& CurrentClock() {
-    Clock* const clock = installedClock.load(std::memory_order_acquire);
-    return clock ? *clock : RealClock::Instance();
-}
-
-void InstallClock(Clock* clock) {
-    installedClock.store(clock, std::memory_order_release);
-}
-
-Microseconds DeadlineAfter(std::uint32_t timeout) {
-    return timeout == Infinite ? Never : CurrentClock().Now() + Microseconds{timeout} * 1000;
 }
 
 }  // namespace Varnholt::Platform::Linux

@@ -33,7 +33,6 @@ class ThreadRecord final {
     // Only the thread itself uses these.
     int priority = 0;
     int niceShift = 0;  ///< what the priority has changed of the thread's nice value
-    unsigned recursiveMutexesHeld = 0;
 
     // For the virtual clock, guarded by the dispatcher lock.
     enum class State {
@@ -41,7 +40,6 @@ class ThreadRecord final {
         Ready,
         Running,
         Blocked,
-        Hosting,  ///< blocked, and its stack is lent to an event
     };
     State state = State::Unknown;
     BlockedCall* call = nullptr;

@@ -1,10 +1,9 @@
-#include "Platform/Linux/RealClock.h"
-
 #include <sched.h>
 #include <sys/prctl.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <atomic>
 #include <chrono>
 #include <memory>
 #include <utility>
@@ -14,8 +13,10 @@
 #include "Platform/Linux/NoDestructor.h"
 #include "Platform/Linux/WaitableObject.h"
 #include "Platform/RealScheduler.h"
+#include "Platform/WaitableObjects.h"
 
-namespace Varnholt::Platform::Linux {
+namespace Varnholt::Platform {
+namespace Linux {
 
 using std::chrono::steady_clock;
 
@@ -44,87 +45,111 @@ class SchedulerOfProcess final {
     NoDestructor<RealScheduler> scheduler_;
 };
 
+/// The system's time; threads run as the system schedules them.
+class RealClock final : public Clock {
+  public:
+    bool IsCooperative() const override { return false; }
+
+    Microseconds Now() override {
+        const auto sinceStart = steady_clock::now().time_since_epoch();
+        return static_cast<Microseconds>(std::chrono::floor<std::chrono::microseconds>(sinceStart).count());
+    }
+
+    WallTime Wall() override {
+        const auto now = std::chrono::floor<std::chrono::milliseconds>(std::chrono::system_clock::now());
+        const auto seconds = std::chrono::floor<std::chrono::seconds>(now);
+        return {seconds.time_since_epoch().count(), static_cast<std::uint16_t>((now - seconds).count())};
+    }
+
+    EventScheduler& Scheduler() override {
+        static SchedulerOfProcess scheduler([](std::function<void()> run) {
+            const HostSignalsBlocked blocked;
+            return std::thread([run = std::move(run)] {
+                // Events are for their time, not for up to 50 us later.
+                constexpr unsigned long ExactTimers = 1;
+                prctl(PR_SET_TIMERSLACK, ExactTimers);
+                run();
+            });
+        });
+        return *scheduler;
+    }
+
+    void Block(DispatcherLock& hold, BlockedCall& call, Microseconds deadline) override {
+        while (!call.woken && Now() < deadline && HandleEvents(hold, call, deadline)) {
+        }
+        const auto woken = [&call] { return call.woken; };
+        if (deadline == Never) {
+            hold.Wait(*call.thread.turn, woken);
+        } else {
+            const steady_clock::time_point end{std::chrono::microseconds(deadline)};
+            hold.Wait(*call.thread.turn, end, woken);
+        }
+    }
+
+    void Wake(BlockedCall& call) override {
+        call.woken = true;
+        if (!call.handlesEvents) {
+            DispatcherLock::NotifyOnRelease(call.thread.turn);
+        } else if (!IsCurrentThread(call.thread)) {
+            DispatcherLock::InterruptOnRelease(call.source);
+        }
+    }
+
+    void BlockOnOtherProcess(DispatcherLock& hold, BlockedCall& call, Microseconds deadline,
+                             Microseconds period, WaitableObject* only, std::uint32_t seen) override {
+        const Microseconds now = Now();
+        if (only && deadline > now) {
+            hold.unlock();
+            only->AwaitChange(seen, std::min(deadline - now, LongestAwait));
+            hold.lock();
+        } else {
+            Block(hold, call, std::min(deadline, now + period));
+        }
+    }
+
+    void GiveUpSlice(DispatcherLock& hold) override {
+        hold.unlock();
+        sched_yield();
+        hold.lock();
+    }
+
+  private:
+    /// False when there are no events for the thread to handle.
+    static bool HandleEvents(DispatcherLock& hold, BlockedCall& call, Microseconds deadline) {
+        if (!call.source || !call.source->TryBegin()) {
+            return false;
+        }
+        call.handlesEvents = true;
+        hold.unlock();
+        call.source->HandleEvents(deadline);
+        hold.lock();
+        call.handlesEvents = false;
+        return true;
+    }
+};
+
+std::atomic<Clock*> installedClock = nullptr;
+
 }  // namespace
 
-RealClock& RealClock::Instance() {
-    static NoDestructor<RealClock> clock;
-    return *clock;
+Clock& CurrentClock() {
+    static NoDestructor<RealClock> realClock;
+    Clock* const clock = installedClock.load(std::memory_order_acquire);
+    return clock ? *clock : *realClock;
 }
 
-Microseconds RealClock::Now() {
-    const auto sinceStart = steady_clock::now().time_since_epoch();
-    return static_cast<Microseconds>(std::chrono::floor<std::chrono::microseconds>(sinceStart).count());
+void InstallClock(Clock* clock) {
+    installedClock.store(clock, std::memory_order_release);
 }
 
-WallTime RealClock::Wall() {
-    const auto now = std::chrono::floor<std::chrono::milliseconds>(std::chrono::system_clock::now());
-    const auto seconds = std::chrono::floor<std::chrono::seconds>(now);
-    return {seconds.time_since_epoch().count(), static_cast<std::uint16_t>((now - seconds).count())};
+Microseconds DeadlineAfter(std::uint32_t timeout) {
+    return timeout == Infinite ? Never : CurrentClock().Now() + Microseconds{timeout} * 1000;
 }
 
-EventScheduler& RealClock::Scheduler() {
-    static SchedulerOfProcess scheduler([](std::function<void()> run) {
-        const HostSignalsBlocked blocked;
-        return std::thread([run = std::move(run)] {
-            // Events are for their time, not for up to 50 us later.
-            constexpr unsigned long ExactTimers = 1;
-            prctl(PR_SET_TIMERSLACK, ExactTimers);
-            run();
-        });
-    });
-    return *scheduler;
+}  // namespace Linux
+
+EventScheduler& ClockScheduler() {
+    return Linux::CurrentClock().Scheduler();
 }
 
-/// False when there are no events for the thread to handle.
-bool RealClock::HandleEvents(DispatcherLock& hold, BlockedCall& call, Microseconds deadline) {
-    if (!call.source || !call.source->TryBegin()) {
-        return false;
-    }
-    call.handlesEvents = true;
-    hold.unlock();
-    call.source->HandleEvents(deadline);
-    hold.lock();
-    call.handlesEvents = false;
-    return true;
-}
-
-void RealClock::Block(DispatcherLock& hold, BlockedCall& call, Microseconds deadline) {
-    while (!call.woken && Now() < deadline && HandleEvents(hold, call, deadline)) {
-    }
-    const auto woken = [&call] { return call.woken; };
-    if (deadline == Never) {
-        hold.Wait(*call.thread.turn, woken);
-    } else {
-        const steady_clock::time_point end{std::chrono::microseconds(deadline)};
-        hold.Wait(*call.thread.turn, end, woken);
-    }
-}
-
-void RealClock::Wake(BlockedCall& call) {
-    call.woken = true;
-    if (!call.handlesEvents) {
-        DispatcherLock::NotifyOnRelease(call.thread.turn);
-    } else if (!IsCurrentThread(call.thread)) {
-        DispatcherLock::InterruptOnRelease(call.source);
-    }
-}
-
-void RealClock::BlockOnOtherProcess(DispatcherLock& hold, BlockedCall& call, Microseconds deadline,
-                                    Microseconds period, WaitableObject* only, std::uint32_t seen) {
-    const Microseconds now = Now();
-    if (only && deadline > now) {
-        hold.unlock();
-        only->AwaitChange(seen, std::min(deadline - now, LongestAwait));
-        hold.lock();
-    } else {
-        Block(hold, call, std::min(deadline, now + period));
-    }
-}
-
-void RealClock::GiveUpSlice(DispatcherLock& hold) {
-    hold.unlock();
-    sched_yield();
-    hold.lock();
-}
-
-}  // namespace Varnholt::Platform::Linux
+}  // namespace Varnholt::Platform

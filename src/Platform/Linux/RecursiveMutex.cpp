@@ -1,41 +1,41 @@
+#include <array>
 #include <atomic>
 #include <cstdio>
 #include <cstdlib>
 #include <mutex>
+#include <utility>
 
-#include "Platform/Linux/Dispatcher.h"
-#include "Platform/WaitableObjects.h"
+#include "Platform/Linux/WaitableObject.h"
 
 namespace Varnholt::Platform {
 
 using namespace Linux;
 
 /// The mutex's own lock, and not the dispatcher lock, keeps the threads apart: a tool that looks for data
-/// races then sees exactly the order that the mutex makes.
-struct RecursiveMutex::Impl {
-    class LockingCall final : public BlockedCall {
-      public:
-        LockingCall(ThreadRecord& caller, std::uint32_t ownersNumber)
-            : BlockedCall(caller), owner_(ownersNumber) {}
-        std::string Describe() const override { return "a mutex owned by thread " + std::to_string(owner_); }
-
-        LockingCall* next = nullptr;
-
-      private:
-        const std::uint32_t owner_;
-    };
+/// races then sees exactly the order that the mutex makes. Where threads take turns, they wait for the object
+/// and then try again.
+struct RecursiveMutex::Impl final : WaitableObject {
+    Taken TryTake(ThreadRecord& /*taker*/) override {
+        return std::exchange(wasUnlocked, false) ? Taken::Yes : Taken::No;
+    }
+    ErrorCode Signal(ThreadRecord& /*signaller*/) override {
+        wasUnlocked = true;
+        OfferToWaiters();
+        return Errors::Success;
+    }
+    std::string Describe() const override {
+        return "a mutex owned by thread " + std::to_string(ownersNumber);
+    }
+    void LockCooperatively(ThreadRecord& me, Clock& clock);
 
     std::mutex lock;
     std::atomic<const ThreadRecord*> owner = nullptr;
     unsigned depth = 0;  // of the owner only
 
-    // Where threads take turns. Guarded by the dispatcher lock; the first two are the owner's.
+    // Where threads take turns. Guarded by the dispatcher lock; the last two are the owner's.
+    bool wasUnlocked = false;
     bool ownerIsCooperative = false;
     std::uint32_t ownersNumber = 0;
-    LockingCall* waiting = nullptr;
-
-    void LockCooperatively(ThreadRecord& me, Clock& clock);
-    void UnlockCooperatively(Clock& clock);
 };
 
 void RecursiveMutex::Impl::LockCooperatively(ThreadRecord& me, Clock& clock) {
@@ -50,34 +50,14 @@ void RecursiveMutex::Impl::LockCooperatively(ThreadRecord& me, Clock& clock) {
             hold.lock();
             break;
         }
-        LockingCall call(me, ownersNumber);
-        LockingCall** last = &waiting;
-        while (*last) {
-            last = &(*last)->next;
-        }
-        *last = &call;
-        clock.Block(hold, call, Never);
-        LockingCall** link = &waiting;
-        while (*link != &call) {
-            link = &(*link)->next;
-        }
-        *link = call.next;
-        if (call.hopeless) {
+        std::array entries{WaitEntry{ObjectRef(ObjectRef(), this)}};  // its owner keeps it alive
+        if (WaitForAny(hold, entries, Never).result == WaitResult::Failed) {
             static_cast<void>(std::fputs("A mutex that is never unlocked cannot be locked.\n", stderr));
             std::abort();
         }
     }
     ownerIsCooperative = isCooperative;
     ownersNumber = me.number;
-}
-
-void RecursiveMutex::Impl::UnlockCooperatively(Clock& clock) {
-    DispatcherLock hold;
-    lock.unlock();
-    for (LockingCall* call = waiting; call; call = call->next) {
-        clock.Wake(*call);
-    }
-    clock.Preempt(hold);
 }
 
 RecursiveMutex::RecursiveMutex() = default;
@@ -94,7 +74,6 @@ void RecursiveMutex::lock() {
             impl.lock.lock();
         }
         impl.owner.store(&me, std::memory_order_relaxed);
-        ++me.recursiveMutexesHeld;
     }
     ++impl.depth;
 }
@@ -105,10 +84,12 @@ void RecursiveMutex::unlock() {
         return;
     }
     impl.owner.store(nullptr, std::memory_order_relaxed);
-    --CurrentThread().recursiveMutexesHeld;
     Clock& clock = CurrentClock();
     if (clock.IsCooperative()) {
-        impl.UnlockCooperatively(clock);
+        DispatcherLock hold;
+        impl.lock.unlock();
+        impl.Signal(CurrentThread());
+        clock.Preempt(hold);
     } else {
         impl.lock.unlock();
     }

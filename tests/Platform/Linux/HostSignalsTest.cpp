@@ -7,7 +7,6 @@
 #include "ForkedProcess.h"
 #include "Platform/EventScheduler.h"
 #include "Platform/Linux/HostSignalsBlocked.h"
-#include "Platform/Linux/RealClock.h"
 #include "Support/SignalMasks.h"
 #include "TestThread.h"
 
@@ -43,14 +42,15 @@ TEST(HostSignals, ComeBackAsTheyWere) {
 }
 
 TEST(HostProcess, EndsInAForkedChildWhileAnEventIsAwaited) {
-    EventScheduler& scheduler = Linux::RealClock::Instance().Scheduler();
-    const auto event = scheduler.CallAt(scheduler.Now() + 60'000'000, [] {});
+    EventScheduler& scheduler = ClockScheduler();
+    scheduler.CallAt(
+        scheduler.Now() + 60'000'000, [] {}, this);
     ForkedProcess child([]() -> int {
         alarm(20);
         std::exit(7);
     });
     EXPECT_EQ(child.WaitForExit(), 7);
-    scheduler.Forget(event);
+    scheduler.Forget(this);
 }
 
 }  // namespace
