@@ -127,7 +127,7 @@ void VirtualClock::Wake(BlockedCall& call) {
 
 /// The other process lives in real time: as much of it passes as the wait takes of ours.
 void VirtualClock::BlockOnOtherProcess(DispatcherLock& hold, BlockedCall& call, Microseconds deadline,
-                                       Microseconds period, WaitableObject* /*only*/,
+                                       Microseconds period, ChangeCount* /*changes*/,
                                        std::uint32_t /*seen*/) {
     Block(hold, call, std::min(deadline, now_ + period));
     if (!call.woken) {

@@ -63,7 +63,7 @@ class VirtualClock final : private Linux::Clock, private Platform::EventSchedule
     void Wake(Linux::BlockedCall& call) override;
     void BlockOnOtherProcess(Linux::DispatcherLock& hold, Linux::BlockedCall& call,
                              Linux::Microseconds deadline, Linux::Microseconds period,
-                             Linux::WaitableObject* only, std::uint32_t seen) override;
+                             Linux::ChangeCount* changes, std::uint32_t seen) override;
     void Preempt(Linux::DispatcherLock& hold) override;
     void GiveUpSlice(Linux::DispatcherLock& hold) override;
     void ThreadMade(Linux::DispatcherLock& hold, Linux::ThreadRecord& thread) override;

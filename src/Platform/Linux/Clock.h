@@ -13,8 +13,8 @@
 namespace Varnholt::Platform::Linux {
 
 class BlockedCall;
+class ChangeCount;
 class ThreadRecord;
-class WaitableObject;
 
 /// Microseconds of the clock in force; a clock's origin is its own.
 using Microseconds = std::uint64_t;
@@ -77,10 +77,10 @@ class Clock {
     /// Lets the blocked call return.
     virtual void Wake(BlockedCall& call) = 0;
     /// As `Block` where another process may have to do something. The caller looks again afterwards, because
-    /// this returns in any case: after `period` unless `only` is set, the one object that is waited for,
-    /// whose changes are `seen`.
+    /// this returns in any case: after `period`, or, where one object is waited for, soon after its `changes`
+    /// have passed `seen`.
     virtual void BlockOnOtherProcess(DispatcherLock& hold, BlockedCall& call, Microseconds deadline,
-                                     Microseconds period, WaitableObject* only, std::uint32_t seen) = 0;
+                                     Microseconds period, ChangeCount* changes, std::uint32_t seen) = 0;
 
     /// A platform call begins or has woken somebody: another thread may go first.
     virtual void Preempt(DispatcherLock& /*hold*/) {}

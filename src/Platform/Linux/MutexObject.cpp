@@ -1,8 +1,55 @@
 #include "Platform/Linux/MutexObject.h"
 
+#include <pthread.h>
+
 #include <algorithm>
+#include <cerrno>
+#include <utility>
+
+#include "Platform/Linux/NamedObjects.h"
+#include "Platform/Linux/NoDestructor.h"
+#include "Platform/Linux/SharedContent.h"
 
 namespace Varnholt::Platform::Linux {
+namespace {
+
+struct MutexContent : Header<MutexContent> {
+    static constexpr std::uint64_t Version = 1;
+    pthread_mutex_t mutex{};
+    /// Of the mutex: its last owner ended, or let go of it, without a release.
+    std::uint32_t abandoned = 0;
+
+    bool Initialise() {
+        pthread_mutexattr_t attributes;
+        if (pthread_mutexattr_init(&attributes) != 0) {
+            return false;
+        }
+        // Recursive, because one thread may come to it through two copies of this library.
+        const bool made = pthread_mutexattr_setpshared(&attributes, PTHREAD_PROCESS_SHARED) == 0 &&
+                          pthread_mutexattr_setrobust(&attributes, PTHREAD_MUTEX_ROBUST) == 0 &&
+                          pthread_mutexattr_settype(&attributes, PTHREAD_MUTEX_RECURSIVE) == 0 &&
+                          pthread_mutex_init(&mutex, &attributes) == 0;
+        pthread_mutexattr_destroy(&attributes);
+        return made;
+    }
+};
+
+NoDestructor<NamedObjects<MutexObject>> namedMutexes;
+
+}  // namespace
+
+MutexObject::MutexObject(std::unique_ptr<SharedFile> opened)
+    : WaitableObject(ContentIn<MutexContent>(*opened).changes), file_(std::move(opened)) {}
+
+std::shared_ptr<MutexObject> MutexObject::Open(const std::string& name) {
+    return (*namedMutexes).Open(name, [&name] {
+        if (CurrentClock().IsCooperative()) {
+            return std::make_shared<MutexObject>();
+        }
+        auto file = OpenContent("mutex", name, MutexContent{});
+        return file ? std::make_shared<MutexObject>(std::move(file)) : nullptr;
+    });
+}
 
 WaitableObject::Taken MutexObject::TryTake(ThreadRecord& taker) {
     if (owner_ == &taker) {
@@ -23,11 +70,28 @@ WaitableObject::Taken MutexObject::TryTake(ThreadRecord& taker) {
 }
 
 WaitableObject::Taken MutexObject::TakeFree() {
-    return wasAbandoned_ ? Taken::Abandoned : Taken::Yes;
+    bool wasAbandoned = wasAbandoned_;
+    if (file_) {
+        auto& content = ContentIn<MutexContent>(*file_);
+        const int code = pthread_mutex_trylock(&content.mutex);
+        if (code == EOWNERDEAD) {
+            pthread_mutex_consistent(&content.mutex);
+        } else if (code != 0) {
+            return Taken::No;
+        }
+        wasAbandoned = code == EOWNERDEAD || content.abandoned != 0;
+    }
+    return wasAbandoned ? Taken::Abandoned : Taken::Yes;
 }
 
 void MutexObject::LetGo(bool isAbandoned) {
     wasAbandoned_ = isAbandoned;
+    if (file_) {
+        auto& content = ContentIn<MutexContent>(*file_);
+        content.abandoned = isAbandoned;
+        pthread_mutex_unlock(&content.mutex);
+        content.changes.Increment();
+    }
 }
 
 ErrorCode MutexObject::Release(ThreadRecord& releaser) {
@@ -59,7 +123,8 @@ void MutexObject::LastHandleClosed(ThreadRecord& closer) {
 }
 
 std::string MutexObject::Describe() const {
-    return owner_ ? "a mutex owned by thread " + std::to_string(owner_->number) : "a mutex";
+    const std::string text = owner_ ? "a mutex owned by thread " + std::to_string(owner_->number) : "a mutex";
+    return file_ ? text + " shared between processes" : text;
 }
 
 }  // namespace Varnholt::Platform::Linux

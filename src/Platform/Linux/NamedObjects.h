@@ -1,20 +1,36 @@
 #pragma once
 
-#include <cstdint>
+#include <map>
 #include <memory>
+#include <mutex>
 #include <string>
-
-#include "Platform/Linux/MutexObject.h"
-#include "Platform/Linux/SemaphoreObject.h"
 
 namespace Varnholt::Platform::Linux {
 
-/// The objects that have a name: one for every process, except where threads take turns. Virtual time cannot
-/// wait for other processes, and the tests that run at the same time are to be left alone. Null on failure
-/// with the reason in `LastError`.
-std::shared_ptr<MutexObject> OpenNamedMutex(const std::string& name);
-/// The counts are those of the first that opens the name.
-std::shared_ptr<SemaphoreObject> OpenNamedSemaphore(std::int32_t initialCount, std::int32_t maximumCount,
-                                                    const std::string& name);
+/// The objects of one kind that have a name and that this process has open: two handles of one name lead to
+/// one object.
+template <typename Object>
+class NamedObjects final {
+  public:
+    /// `make` makes what is not open yet; null where that fails.
+    template <typename Make>
+    std::shared_ptr<Object> Open(const std::string& name, Make make) {
+        const std::lock_guard held(lock_);
+        std::erase_if(objects_, [](const auto& entry) { return entry.second.expired(); });
+        const auto found = objects_.find(name);
+        std::shared_ptr<Object> object = found == objects_.end() ? nullptr : found->second.lock();
+        if (!object) {
+            object = make();
+            if (object) {
+                objects_[name] = object;
+            }
+        }
+        return object;
+    }
+
+  private:
+    std::mutex lock_;
+    std::map<std::string, std::weak_ptr<Object>> objects_;  // guarded by `lock`
+};
 
 }  // namespace Varnholt::Platform::Linux

@@ -11,7 +11,7 @@
 #include "Platform/Linux/Dispatcher.h"
 #include "Platform/Linux/HostSignalsBlocked.h"
 #include "Platform/Linux/NoDestructor.h"
-#include "Platform/Linux/WaitableObject.h"
+#include "Platform/Linux/SharedContent.h"
 #include "Platform/RealScheduler.h"
 #include "Platform/WaitableObjects.h"
 
@@ -96,11 +96,11 @@ class RealClock final : public Clock {
     }
 
     void BlockOnOtherProcess(DispatcherLock& hold, BlockedCall& call, Microseconds deadline,
-                             Microseconds period, WaitableObject* only, std::uint32_t seen) override {
+                             Microseconds period, ChangeCount* changes, std::uint32_t seen) override {
         const Microseconds now = Now();
-        if (only && deadline > now) {
+        if (changes && deadline > now) {
             hold.unlock();
-            only->AwaitChange(seen, std::min(deadline - now, LongestAwait));
+            changes->Await(seen, std::min(deadline - now, LongestAwait));
             hold.lock();
         } else {
             Block(hold, call, std::min(deadline, now + period));

@@ -48,22 +48,9 @@ std::unique_ptr<SharedFile> OpenContent(const std::string& kind, const std::stri
          .isValid = [](const void* memory) { return static_cast<const Content*>(memory)->IsValid(); }});
 }
 
-/// An object of the kind `Base` whose state stands in such a file.
-template <typename Base, typename Content>
-class SharedObject : public Base {
-  public:
-    explicit SharedObject(std::unique_ptr<SharedFile> opened)
-        : content_(*static_cast<Content*>(opened->Memory())), file_(std::move(opened)) {}
-
-    bool IsHeldElsewhere() const override { return true; }
-    std::uint32_t Changes() const final { return content_.changes.Get(); }
-    void AwaitChange(std::uint32_t seen, Microseconds limit) final { content_.changes.Await(seen, limit); }
-
-  protected:
-    Content& content_;
-
-  private:
-    const std::unique_ptr<SharedFile> file_;
-};
+template <typename Content>
+Content& ContentIn(const SharedFile& file) {
+    return *static_cast<Content*>(file.Memory());
+}
 
 }  // namespace Varnholt::Platform::Linux

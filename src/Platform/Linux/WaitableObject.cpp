@@ -2,6 +2,8 @@
 
 #include <algorithm>
 
+#include "Platform/Linux/SharedContent.h"
+
 namespace Varnholt::Platform::Linux {
 namespace {
 
@@ -96,17 +98,17 @@ void WaitableObject::OfferToWaiters() {
 WaitAnyResult WaitForAny(DispatcherLock& hold, std::span<WaitEntry> entries, Microseconds deadline) {
     Waiter waiter(CurrentThread(), entries);
     Clock& clock = CurrentClock();
-    WaitableObject* const only = entries.size() == 1 ? entries[0].object.get() : nullptr;
+    ChangeCount* const changes = entries.size() == 1 ? entries[0].object->SharedChanges() : nullptr;
     Microseconds period = FirstLook;
     while (true) {
         // Before the look at the object, so that no change comes between the two.
-        const std::uint32_t seen = only ? only->Changes() : 0;
+        const std::uint32_t seen = changes ? changes->Get() : 0;
         waiter.woken = false;
         if (waiter.IsSatisfied() || waiter.Take() || clock.Now() >= deadline) {
             return waiter.Outcome();
         }
         if (waiter.NeedsOtherProcess()) {
-            clock.BlockOnOtherProcess(hold, waiter, deadline, period, only, seen);
+            clock.BlockOnOtherProcess(hold, waiter, deadline, period, changes, seen);
             period = std::min(2 * period, LongestLook);
         } else {
             clock.Block(hold, waiter, deadline);

@@ -12,6 +12,7 @@
 
 namespace Varnholt::Platform::Linux {
 
+class ChangeCount;
 class WaitableObject;
 class Waiter;
 
@@ -35,6 +36,8 @@ class WaitableObject {
     enum class Taken { No, Yes, Abandoned };
 
     WaitableObject() = default;
+    /// Of an object that other processes share: what they do with it is counted.
+    explicit WaitableObject(ChangeCount& sharedChanges) : changes_(&sharedChanges) {}
     virtual ~WaitableObject() = default;
     WaitableObject(const WaitableObject&) = delete;
     WaitableObject& operator=(const WaitableObject&) = delete;
@@ -45,12 +48,10 @@ class WaitableObject {
     virtual ErrorCode Signal(ThreadRecord& signaller) = 0;
     /// False when `taker` must be the calling thread; who waits is then woken to take the object himself.
     virtual bool CanBeTakenForOthers() const { return true; }
-    /// True when another process may have to make the object available. `Changes` then counts what may have
-    /// made it so, and `AwaitChange`, without the dispatcher lock, returns soon after it has passed `seen`,
-    /// and after `limit` at the latest.
+    /// True when another process may have to make the object available.
     virtual bool IsHeldElsewhere() const { return false; }
-    virtual std::uint32_t Changes() const { return 0; }
-    virtual void AwaitChange(std::uint32_t /*seen*/, Microseconds /*limit*/) {}
+    /// Counts what may have made it so. Null where no other process has the object.
+    ChangeCount* SharedChanges() const { return changes_; }
     /// Where its signal comes from, when that is a transfer's end.
     virtual std::shared_ptr<CompletionSource> SignalledBy() const { return nullptr; }
     /// After a wait of the caller has taken the object, without the dispatcher lock.
@@ -70,6 +71,7 @@ class WaitableObject {
     WaitEntry* last_ = nullptr;
     friend class HandleTable;
     std::size_t handles_ = 0;
+    ChangeCount* const changes_ = nullptr;
 };
 
 /// Waits until the object of one of `entries` could be taken for the calling thread. With the dispatcher lock

@@ -7,7 +7,6 @@
 #include "Platform/Linux/EventObject.h"
 #include "Platform/Linux/HandleTable.h"
 #include "Platform/Linux/MutexObject.h"
-#include "Platform/Linux/NamedObjects.h"
 #include "Platform/Linux/SemaphoreObject.h"
 
 namespace Varnholt::Platform {
@@ -86,7 +85,7 @@ void ResetEvent(Handle event, const std::shared_ptr<CompletionSource>& source) {
 
 Handle MakeMutex(const std::string& name) {
     return HandleOf("MakeMutex", [&] {
-        return AddIfMade(name.empty() ? std::make_shared<MutexObject>() : OpenNamedMutex(name));
+        return AddIfMade(name.empty() ? std::make_shared<MutexObject>() : MutexObject::Open(name));
     });
 }
 
@@ -101,8 +100,8 @@ Handle MakeSemaphore(std::int32_t initialCount, std::int32_t maximumCount, const
             SetLastError(Errors::InvalidParameter);
             return NoHandle;
         }
-        return AddIfMade(name.empty() ? std::make_shared<LocalSemaphore>(initialCount, maximumCount)
-                                      : OpenNamedSemaphore(initialCount, maximumCount, name));
+        return AddIfMade(name.empty() ? std::make_shared<SemaphoreObject>(initialCount, maximumCount)
+                                      : SemaphoreObject::Open(initialCount, maximumCount, name));
     });
 }
 
