@@ -19,40 +19,30 @@ constexpr std::uint64_t Patience = 5'000'000;
 }  // namespace
 
 UsbIpConnection::UsbIpConnection(PollLoop& pollLoop, Platform::Linux::FileDescriptor connectedSocket,
-                                 std::unique_ptr<UsbIpExports> offered, Over whenOver)
+                                 std::unique_ptr<UsbIpExports> offered,
+                                 std::shared_ptr<Platform::Usb::UsbDevice> imported, Over whenOver)
     : loop_(pollLoop),
       file_(std::move(connectedSocket)),
       exports_(std::move(offered)),
-      over_(std::move(whenOver)) {}
-
-UsbIpConnection::~UsbIpConnection() {
-    StopListening();
-    session_.reset();
-}
-
-void UsbIpConnection::Begin() {
-    session_ = std::make_unique<UsbIpSession>(*exports_, [this] { FlushSoon(); });
-    Watch();
-}
-
-void UsbIpConnection::BeginWith(std::shared_ptr<Platform::Usb::UsbDevice> device) {
-    session_ = std::make_unique<UsbIpSession>(std::move(device), [this] { FlushSoon(); });
+      over_(std::move(whenOver)),
+      session_(imported ? UsbIpSession(std::move(imported), [this] { FlushSoon(); })
+                        : UsbIpSession(*exports_, [this] { FlushSoon(); })) {
     Watch();
 }
 
 void UsbIpConnection::Watch() {
     short events = 0;
-    if (session_->WantsInput()) {
+    if (session_.WantsInput()) {
         events = static_cast<short>(events | POLLIN);
     }
-    if (!session_->Output().empty()) {
+    if (!session_.Output().empty()) {
         events = static_cast<short>(events | POLLOUT);
     }
     if (events != watchedFor_) {
         watchedFor_ = events;
         loop_.Watch(file_.Get(), events, [this] { Ready(); });
     }
-    if (!checksPeer_ && session_->PeerIsDue()) {
+    if (!checksPeer_ && session_.PeerIsDue()) {
         CheckPeerAt(loop_.Now() + Patience);
     }
 }
@@ -61,7 +51,7 @@ void UsbIpConnection::CheckPeerAt(std::uint64_t time) {
     checksPeer_ = true;
     const auto check = [this] {
         checksPeer_ = false;
-        if (!session_->PeerIsDue()) {
+        if (!session_.PeerIsDue()) {
             return;
         }
         if (lastMoved_ + Patience > loop_.Now()) {
@@ -86,7 +76,7 @@ void UsbIpConnection::FlushSoon() {
 }
 
 void UsbIpConnection::Ready() {
-    if (session_->WantsInput() && inputStart_ == inputEnd_) {
+    if (session_.WantsInput() && inputStart_ == inputEnd_) {
         const ssize_t count = recv(file_.Get(), input_.data(), input_.size(), MSG_DONTWAIT);
         if (count == 0 || (count < 0 && errno != EAGAIN && errno != EINTR)) {
             End();
@@ -102,14 +92,14 @@ void UsbIpConnection::Ready() {
 /// Lets the session have what was received, and the peer what the session has for it, as far as it goes.
 void UsbIpConnection::Flush() {
     do {
-        inputStart_ += session_->Receive(std::span(input_).subspan(inputStart_, inputEnd_ - inputStart_));
+        inputStart_ += session_.Receive(std::span(input_).subspan(inputStart_, inputEnd_ - inputStart_));
         if (!SendOutput()) {
             End();
             return;
         }
-    } while (session_->WantsInput() && inputStart_ < inputEnd_);
-    if (session_->Over() && session_->Output().empty()) {
-        End(session_->Complaint());
+    } while (session_.WantsInput() && inputStart_ < inputEnd_);
+    if (session_.Over() && session_.Output().empty()) {
+        End(session_.Complaint());
         return;
     }
     Watch();
@@ -117,14 +107,14 @@ void UsbIpConnection::Flush() {
 
 /// False when the peer is lost.
 bool UsbIpConnection::SendOutput() {
-    while (!session_->Output().empty()) {
-        const auto output = session_->Output();
+    while (!session_.Output().empty()) {
+        const auto output = session_.Output();
         const ssize_t count = send(file_.Get(), output.data(), output.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
         if (count < 0 && errno != EINTR) {
             return errno == EAGAIN;
         }
         lastMoved_ = loop_.Now();
-        session_->OutputSent(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+        session_.OutputSent(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
     }
     return true;
 }

@@ -20,17 +20,14 @@ class UsbIpConnection final {
     /// the connection's own functions: it is to be destroyed later.
     using Over = std::function<void(UsbIpConnection& connection, const std::string& complaint)>;
 
-    /// The socket does not block; `offered` is what the peer can import. The loop must outlive it.
+    /// The socket does not block; `offered` is what the peer can import. `imported` is a claimed device that
+    /// the peer need not ask for; null where it has to. The loop must outlive it.
     UsbIpConnection(PollLoop& pollLoop, Platform::Linux::FileDescriptor connectedSocket,
-                    std::unique_ptr<UsbIpExports> offered, Over whenOver);
-    ~UsbIpConnection();
+                    std::unique_ptr<UsbIpExports> offered, std::shared_ptr<Platform::Usb::UsbDevice> imported,
+                    Over whenOver);
+    ~UsbIpConnection() { StopListening(); }
     UsbIpConnection(const UsbIpConnection&) = delete;
     UsbIpConnection& operator=(const UsbIpConnection&) = delete;
-
-    /// Waits for what the peer wants.
-    void Begin();
-    /// Begins with a claimed device that the peer need not ask for.
-    void BeginWith(std::shared_ptr<Platform::Usb::UsbDevice> device);
 
   private:
     void Watch();
@@ -47,7 +44,6 @@ class UsbIpConnection final {
     const Platform::Linux::FileDescriptor file_;
     std::unique_ptr<UsbIpExports> exports_;
     const Over over_;
-    std::unique_ptr<UsbIpSession> session_;
     // Received and not taken yet. Its size bounds how long one peer keeps the others waiting.
     std::array<std::uint8_t, 65536> input_{};
     std::size_t inputStart_ = 0;
@@ -57,6 +53,7 @@ class UsbIpConnection final {
     std::uint64_t lastMoved_ = 0;  // when bytes went either way
     short watchedFor_ = -1;
     bool ended_ = false;
+    UsbIpSession session_;  ///< ends first
 };
 
 }  // namespace Varnholt::Simulator

@@ -143,7 +143,6 @@ UsbIpServer::UsbIpServer(PollLoop& pollLoop, Log logger) : loop_(pollLoop), log_
 
 UsbIpServer::~UsbIpServer() {
     loop_.Forget(this);
-    removed_.clear();
     connections_.clear();
     for (const Listener& listener : listeners_) {
         loop_.Unwatch(listener.file.Get());
@@ -257,39 +256,38 @@ void UsbIpServer::Accept(const Listener& listener) {
         setsockopt(file.Get(), IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
     }
     if (connections_.size() < mostConnections) {
-        Connect(std::move(file),
-                std::make_unique<Exports>(*this, listener.offered, peer, !listener.unixSocket), peer)
-            .Begin();
+        auto exports = std::make_unique<Exports>(*this, listener.offered, peer, !listener.unixSocket);
+        Connect(std::move(file), std::move(exports), nullptr, peer);
     }
 }
 
 void UsbIpServer::Serve(FileDescriptor connectedSocket, const std::string& name, const std::string& peer) {
     auto exports = std::make_unique<Exports>(*this, std::vector<Exported*>(), peer, false);
-    const std::shared_ptr<UsbDevice> device = exports->Take(Find(name)).device;
+    std::shared_ptr<UsbDevice> device = exports->Take(Find(name)).device;
     if (!device) {
         throw std::runtime_error("\"" + name + "\" is in use");
     }
     fcntl(connectedSocket.Get(), F_SETFL, O_NONBLOCK);
-    Connect(std::move(connectedSocket), std::move(exports), peer).BeginWith(device);
+    Connect(std::move(connectedSocket), std::move(exports), std::move(device), peer);
 }
 
-UsbIpConnection& UsbIpServer::Connect(FileDescriptor file, std::unique_ptr<Exports> exports,
-                                      const std::string& peer) {
+void UsbIpServer::Connect(FileDescriptor file, std::unique_ptr<Exports> exports,
+                          std::shared_ptr<UsbDevice> imported, const std::string& peer) {
     const auto over = [this, peer](UsbIpConnection& connection, const std::string& complaint) {
         if (!complaint.empty()) {
             Tell(peer + ": " + complaint);
         }
         Remove(connection);
     };
-    return *connections_.emplace_back(
-        std::make_unique<UsbIpConnection>(loop_, std::move(file), std::move(exports), over));
+    connections_.push_back(std::make_unique<UsbIpConnection>(loop_, std::move(file), std::move(exports),
+                                                             std::move(imported), over));
 }
 
 void UsbIpServer::Remove(UsbIpConnection& connection) {
     const auto found =
         std::ranges::find_if(connections_, [&](const auto& each) { return each.get() == &connection; });
-    removed_.splice(removed_.end(), connections_, found);
-    loop_.CallSoon([this] { removed_.clear(); }, this);
+    loop_.CallSoon([kept = std::shared_ptr<UsbIpConnection>(std::move(*found))] {}, this);
+    connections_.erase(found);
 }
 
 }  // namespace Varnholt::Simulator

@@ -63,9 +63,9 @@ class UsbIpServer final {
     void Listen();
     void PauseListening();
     void Accept(const Listener& listener);
-    /// Adds a connection, which has yet to begin.
-    UsbIpConnection& Connect(Platform::Linux::FileDescriptor file, std::unique_ptr<Exports> exports,
-                             const std::string& peer);
+    /// Adds a connection; `imported` as `UsbIpConnection` has it.
+    void Connect(Platform::Linux::FileDescriptor file, std::unique_ptr<Exports> exports,
+                 std::shared_ptr<Platform::Usb::UsbDevice> imported, const std::string& peer);
     /// Ends a connection as soon as what is being called has returned: it may be one of its own functions.
     void Remove(UsbIpConnection& connection);
     void Tell(const std::string& line) const;
@@ -75,7 +75,6 @@ class UsbIpServer final {
     std::list<Exported> exportedInstruments_;
     std::list<Listener> listeners_;
     std::list<std::unique_ptr<UsbIpConnection>> connections_;
-    std::list<std::unique_ptr<UsbIpConnection>> removed_;
 };
 
 }  // namespace Varnholt::Simulator
