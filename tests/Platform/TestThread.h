@@ -3,14 +3,21 @@
 #include <gtest/gtest.h>
 
 #include <functional>
+#include <ostream>
 #include <utility>
 
 #include "Platform/ErrorCodes.h"
 #include "Platform/Threads.h"
 #include "Platform/WaitableObjects.h"
-#include "Printing.h"
 
 namespace Varnholt::Platform {
+
+inline void PrintTo(WaitResult result, std::ostream* stream) {
+    *stream << (result == WaitResult::Signalled   ? "Signalled"
+                : result == WaitResult::Abandoned ? "Abandoned"
+                : result == WaitResult::TimedOut  ? "TimedOut"
+                                                  : "Failed");
+}
 
 /// Longer than any wait that ought to succeed; a test that fails must still end.
 inline constexpr std::uint32_t LongTimeout = 20'000;

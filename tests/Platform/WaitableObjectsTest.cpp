@@ -8,7 +8,6 @@
 #include <vector>
 
 #include "EachClock.h"
-#include "Platform/CallFilter.h"
 #include "Platform/Time.h"
 #include "Platform/WaitableObjects.h"
 #include "TestThread.h"
@@ -263,37 +262,6 @@ TEST_P(Waits, WithASignalThatFailsDoNotBegin) {
         EXPECT_EQ(ErrorOf(SignalAndWait(toSignal, event.Get(), LongTimeout) != WaitResult::Failed), code);
     }
     EXPECT_EQ(Wait(event.Get(), 0), WaitResult::Signalled) << "the wait took the signal all the same";
-}
-
-std::uint32_t Nothing(void*) {
-    return 0;
-}
-
-TEST(CallFilters, MakeCallsFailWithoutTouchingTheSystem) {
-    const OwnedHandle event(MakeAutoResetEvent());
-    const OwnedHandle mutex(MakeMutex(""));
-    const OwnedHandle semaphore(MakeSemaphore(1, 2, ""));
-    Wait(mutex.Get(), 0);
-    SignalEvent(event.Get());
-    const std::vector<std::tuple<std::string_view, std::function<bool()>>> calls{
-        {"StartThread", [&] { return static_cast<bool>(OwnedHandle(StartThread(&Nothing, nullptr))); }},
-        {"MakeAutoResetEvent", [&] { return static_cast<bool>(OwnedHandle(MakeAutoResetEvent())); }},
-        {"MakeMutex", [&] { return static_cast<bool>(OwnedHandle(MakeMutex(""))); }},
-        {"MakeSemaphore", [&] { return static_cast<bool>(OwnedHandle(MakeSemaphore(0, 1, ""))); }},
-        {"SignalEvent", [&] { return SignalEvent(event.Get()); }},
-        {"ReleaseMutex", [&] { return ReleaseMutex(mutex.Get()); }},
-        {"ReleaseSemaphore", [&] { return ReleaseSemaphore(semaphore.Get(), 1); }},
-        {"Wait", [&] { return Wait(event.Get(), 0) == WaitResult::Signalled; }},
-        {"WaitAny", [&] { return WaitAny(std::array{semaphore.Get()}, 0).result == WaitResult::Signalled; }},
-        {"SignalAndWait",
-         [&] { return SignalAndWait(event.Get(), semaphore.Get(), 0) == WaitResult::Signalled; }},
-    };
-    for (const auto& [name, succeeds] : calls) {
-        InstallCallFilter([&name](std::string_view call) { return call == name ? 1450u : 0u; });
-        EXPECT_EQ(ErrorOf(succeeds()), 1450u) << name;
-        InstallCallFilter({});
-        EXPECT_TRUE(succeeds()) << name;
-    }
 }
 
 }  // namespace

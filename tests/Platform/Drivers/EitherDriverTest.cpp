@@ -1,5 +1,6 @@
 // What the instrument's own driver and the USBIO driver have in common, each with its own controls and codes.
 #include "Platform/Drivers/DriverFixture.h"
+#include "Support/Transport.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -10,11 +11,9 @@ namespace UsbIo = Protocol::UsbIoDriver;
 using namespace Platform;
 using namespace Protocol;
 
-enum class Kind { Native, UsbIo };
-
-class EitherDriver : public DriverFixture, public testing::WithParamInterface<Kind> {
+class EitherDriver : public DriverFixture, public testing::WithParamInterface<Transport> {
   protected:
-    bool IsNative() const { return GetParam() == Kind::Native; }
+    bool IsNative() const { return GetParam() == Transport::Native; }
     ErrorCode Code(ErrorCode native, ErrorCode usbIo) const { return IsNative() ? native : usbIo; }
     Handle OpenEndpoint(std::uint8_t endpoint) {
         if (!IsNative()) {
@@ -36,10 +35,7 @@ class EitherDriver : public DriverFixture, public testing::WithParamInterface<Ki
                        RequestBlock(request, value, index), data);
     }
 };
-INSTANTIATE_TEST_SUITE_P(, EitherDriver, testing::Values(Kind::Native, Kind::UsbIo),
-                         [](const auto& parameter) {
-                             return parameter.param == Kind::Native ? "Native" : "UsbIo";
-                         });
+OSTRA_ON_BOTH_TRANSPORTS(EitherDriver);
 
 TEST_P(EitherDriver, CarriesVendorRequests) {
     const auto file = OpenMain();

@@ -1,3 +1,6 @@
+#include <atomic>
+#include <new>
+#include <string>
 #include <thread>
 #include <vector>
 
@@ -15,6 +18,7 @@ namespace Native = Protocol::NativeDriver;
 using namespace Platform;
 
 constexpr std::uint8_t Interrupt = Protocol::InterruptInEndpoint;
+constexpr auto Complete = &HookedDevice::Complete;
 
 /// What holds for every file, whichever driver stands behind it.
 class OverlappedFiles : public DriverFixture {
@@ -112,8 +116,8 @@ TEST_F(OverlappedFiles, ClosingEndsWhatRuns) {
     for (const bool later : {false, true}) {
         if (later) {
             device_->onCancel = [](Transfer& transfer) {
-                Platform::ClockScheduler().CallAt(
-                    0, [&] { HookedDevice::Complete(transfer, TransferStatus::Cancelled, 0); });
+                Platform::ClockScheduler().CallAt(0,
+                                                  [&] { Complete(transfer, TransferStatus::Cancelled, 0); });
             };
         }
         std::vector<Bytes> buffers(20, Bytes(8));
@@ -167,6 +171,95 @@ TEST_F(OverlappedFiles, FailuresPutInNeitherReleaseTheBufferNorKeepTheSignal) {
     device_->Send(In, {1});
     Platform::InstallCallFilter({});
     EXPECT_TRUE(request_.TakeSignal());
+}
+
+// Every order in which acceptance, cancellation and completion of one read can meet.
+TEST_F(OverlappedFiles, EndOnceInEveryOrder) {
+    // In the submission it is cancelled (c), done (d), refused (r). A cancellation that ends it does so with
+    // three bytes, as soon as the device is told.
+    const auto main = Open("native/port1");
+    for (const auto& [name, inSubmit, endedByCancel, outcome, cancels] :
+         std::vector<std::tuple<const char*, std::string, bool, Outcome, int>>{
+             {"completed in submit", "d", false, {0, 8}, 0},
+             {"cancelled before it was accepted", "c", true, {Errors::OperationAborted, 3}, 1},
+             {"cancelled, then completed, in submit", "cd", false, {0, 8}, 0},
+             {"cancelled, then refused", "cr", false, {Errors::GeneralFailure, 0}, 0},
+             {"cancelled before accepted, completed later", "c", false, {0, 8}, 1},
+         }) {
+        SCOPED_TRACE(name);
+        const bool refused = inSubmit.ends_with('r');
+        const bool atOnce = inSubmit.ends_with('d');
+        Transfer* running = nullptr;
+        device_->cancellations = 0;
+        device_->onSubmit = [&](Transfer& transfer) {
+            if (inSubmit.starts_with('c')) {
+                Control(main, Protocol::NativeDriver::ControlAbortPipe,
+                        NativeBlock(0, 0, Protocol::BulkInEndpoint));
+            }
+            if (refused) {
+                return Errors::GeneralFailure;
+            }
+            if (atOnce) {
+                Complete(transfer, TransferStatus::Completed, 8);
+            } else {
+                running = &transfer;
+            }
+            return Errors::Success;
+        };
+        device_->onCancel = [&](Transfer& transfer) {
+            EXPECT_EQ(&transfer, running) << "cancelled what the device does not have";
+            if (endedByCancel) {
+                running = nullptr;
+                Complete(transfer, TransferStatus::Cancelled, 3);
+            }
+        };
+        Request request;
+        EXPECT_EQ(StartRead(pipe_, buffer_, request), atOnce);
+        EXPECT_TRUE(atOnce || Platform::LastError() == (refused ? outcome.code : Errors::IoPending))
+            << Platform::LastError();
+        if (running != nullptr) {
+            Complete(*running, TransferStatus::Completed, 8);
+        }
+        EXPECT_EQ(Result(pipe_, request), outcome);
+        EXPECT_EQ(request.TakeSignal(), !refused);
+        EXPECT_FALSE(request.TakeSignal()) << "signalled twice";
+        EXPECT_EQ(device_->cancellations, cancels);
+    }
+}
+
+// The device may still be looking at a transfer that it has completed: the cancellation must return first.
+TEST_F(OverlappedFiles, CloseAfterACancellationUnderWay) {
+    std::atomic<bool> closed{false};
+    std::thread closer;
+    device_->onCancel = [&](Transfer& transfer) {
+        Complete(transfer, TransferStatus::Cancelled, 0);
+        closer = std::thread([&] {
+            EXPECT_TRUE(files_->CloseFile(pipe_));
+            closed = true;
+        });
+        Platform::SleepMilliseconds(20);
+        EXPECT_FALSE(closed);
+    };
+    StartPending(pipe_, buffer_, request_);
+    EXPECT_TRUE(files_->CancelTransfers(pipe_));
+    closer.join();
+    EXPECT_EQ(device_->cancellations, 1);
+    EXPECT_TRUE(request_.TakeSignal());
+}
+
+// A failure that is known at once is still the result of a request that was started.
+TEST_F(OverlappedFiles, MakeAFailureInsideTheStartAResult) {
+    device_->onSubmit = [](Transfer& transfer) {
+        Complete(transfer, TransferStatus::IoError, 0xFFFF);
+        return Errors::Success;
+    };
+    StartPending(pipe_, buffer_, request_);
+    EXPECT_TRUE(request_.TakeSignal());
+    EXPECT_EQ(Result(pipe_, request_), (Outcome{Errors::GeneralFailure, 8})) << "no more than was asked for";
+
+    device_->onSubmit = [](Transfer&) -> Platform::ErrorCode { throw std::bad_alloc(); };
+    EXPECT_EQ(Read(pipe_, buffer_).code, Errors::NotEnoughMemory);
+    EXPECT_TRUE(files_->CloseFile(pipe_)) << "nothing is left running";
 }
 
 // As they do for a host that forgets to close them.

@@ -6,7 +6,6 @@
 
 #include <filesystem>
 #include <fstream>
-#include <functional>
 #include <set>
 
 #include "ForkedProcess.h"
@@ -21,6 +20,28 @@ namespace {
 
 using Linux::SharedFile;
 using Linux::UserDirectory;
+
+/// Puts something in the place of a file or a directory of ours; false where only root can do that.
+using Squatter = bool (*)(const std::string& path);
+bool File(const std::string& path) {
+    return std::ofstream(path).is_open();
+}
+bool Directory(const std::string& path) {
+    return mkdir(path.c_str(), 0777) == 0;
+}
+bool Pipe(const std::string& path) {
+    return mkfifo(path.c_str(), 0600) == 0;
+}
+bool Link(const std::string& path) {
+    return symlink(testing::TempDir().c_str(), path.c_str()) == 0;
+}
+bool DeadLink(const std::string& path) {
+    return symlink("/nonexistent", path.c_str()) == 0;
+}
+template <Squatter Make>
+bool GivenAway(const std::string& path) {
+    return geteuid() == 0 && Make(path) && chown(path.c_str(), 1, 1) == 0;
+}
 
 std::string PathOf(const std::string& name) {
     return UserDirectory::Open()->Path() + "/" + SharedFile::FileNameOf("mutex", name);
@@ -69,20 +90,9 @@ TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
 }
 
 TEST_F(SharedFiles, ThatAreNoFilesOfOursAreRefused) {
-    const std::vector<std::pair<const char*, std::function<bool(const std::string&)>>> cases{
-        {"link", [](const std::string& file) { return symlink("/dev/null", file.c_str()) == 0; }},
-        {"directory", [](const std::string& file) { return mkdir(file.c_str(), 0700) == 0; }},
-        {"named pipe", [](const std::string& file) { return mkfifo(file.c_str(), 0600) == 0; }},
-        {"file of another user",
-         [](const std::string& file) {
-             std::ofstream{file};
-             return chown(file.c_str(), 1, 1) == 0;
-         }},
-    };
-    for (const auto& [text, make] : cases) {
-        SCOPED_TRACE(text);
-        if (!make(path_)) {
-            EXPECT_NE(geteuid(), 0u);  // only root can give a file away
+    for (const Squatter squatter : {&Link, &DeadLink, &Directory, &Pipe, &GivenAway<&File>}) {
+        if (!squatter(path_)) {
+            EXPECT_NE(geteuid(), 0u);
             continue;
         }
         EXPECT_EQ(ErrorOf(MakeMutex(name_) != NoHandle), Errors::AccessDenied);
@@ -122,6 +132,45 @@ TEST(SharedFileNames, AreFileNamesOfBoundedLengthAndDiffer) {
         EXPECT_TRUE(fileNames.insert(fileName).second) << fileName;
     }
     EXPECT_NE(SharedFile::FileNameOf("mutex", "a"), SharedFile::FileNameOf("semaphore", "a"));
+}
+
+/// Stands for the machine's shared memory.
+class UserDirectories : public testing::Test {
+  protected:
+    void SetUp() override { std::filesystem::create_directory(above_); }
+    void TearDown() override { std::filesystem::remove_all(above_); }
+
+    const std::string above_ = testing::TempDir() + UniqueName("shared-memory");
+    const std::string first_ = above_ + "/ostra-" + std::to_string(geteuid());
+};
+
+TEST_F(UserDirectories, AreFoundBesideWhatOthersPutInTheirPlace) {
+    std::string expected = first_;
+    int taken = 0;
+    for (const Squatter squatter : {&File, &Pipe, &Link, &DeadLink, &GivenAway<&Directory>}) {
+        SCOPED_TRACE(taken);
+        if (!squatter(expected)) {
+            EXPECT_NE(geteuid(), 0u);
+            break;
+        }
+        expected = first_ + "." + std::to_string(++taken);
+        struct stat state {};
+        for (int time = 0; time < 2; ++time) {  // makes it, and finds it
+            const auto directory = UserDirectory::Open(above_);
+            ASSERT_TRUE(directory);
+            EXPECT_EQ(directory->Path(), expected);
+            ASSERT_EQ(fstat(directory->Descriptor(), &state), 0);
+            EXPECT_EQ(state.st_uid, geteuid());
+            EXPECT_EQ(state.st_mode & 0777, 0700u);
+        }
+        std::filesystem::remove(expected);
+    }
+}
+
+TEST_F(UserDirectories, SayWhyTheyCannotBeHad) {
+    std::ofstream{above_ + "/file"};
+    EXPECT_EQ(ErrorOf(UserDirectory::Open(above_ + "/nothing") != nullptr), Errors::FileNotFound);
+    EXPECT_EQ(ErrorOf(UserDirectory::Open(above_ + "/file") != nullptr), Errors::PathNotFound);
 }
 
 }  // namespace

@@ -6,9 +6,7 @@
 
 #include <algorithm>
 #include <chrono>
-#include <cstring>
 #include <optional>
-#include <string>
 #include <thread>
 #include <vector>
 

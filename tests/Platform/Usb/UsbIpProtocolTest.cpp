@@ -7,6 +7,7 @@
 
 #include "Platform/Usb/UsbDescriptors.h"
 #include "Platform/Usb/UsbIpProtocol.h"
+#include "Protocol/ByteOrder.h"
 #include "Support/Bytes.h"
 
 namespace Varnholt::Platform::Usb {
@@ -21,27 +22,21 @@ Bytes Part(const Array& array, std::size_t start, std::size_t length) {
 }
 
 TEST(UsbIpProtocolTest, PacketsHaveTheirFieldsWhereAKernelLooksForThem) {
-    // Behind these bytes the rest of the 48 is zero.
     const UsbIp::SubmitPacket control{0x01020304, 0x10002, 0, 8, 0, {0x40, 0xC1, 0x1122, 0x3344, 8}, false};
     const UsbIp::SubmitPacket bulkIn{5, 0x10002, 0x82, 0x10000, 0, {}, true};
-    for (const auto& [name, packet, start] : std::vector<std::tuple<const char*, UsbIp::Packet, Bytes>>{
-             {"control out",
-              control,
-              {0,    0,    0,    1,    1,    2,    3, 4, 0, 1, 0, 2, 0, 0, 0, 0, 0, 0, 0, 0,  //
-               0,    0,    0,    0,    0,    0,    0, 8, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0,  //
-               0x40, 0xC1, 0x22, 0x11, 0x44, 0x33, 8, 0}},
-             {"bulk in", bulkIn, {0, 0, 0, 1, 0, 0, 0, 5, 0, 1, 0, 2, 0, 0, 0, 1, 0, 0, 0, 2,  //
-                                  0, 0, 2, 0, 0, 1, 0, 0}},
-             {"unlink", UsbIp::UnlinkPacket{7, 0x00010002, 5}, {0, 0, 0, 2, 0, 0, 0, 7, 0, 1, 0, 2,
-                                                                0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 5}},
-             {"submit reply", UsbIp::SubmitReply{5, -32, 0x100}, {0,    0,    0,    3,    0, 0, 0, 5, 0, 0,
-                                                                  0,    0,    0,    0,    0, 0, 0, 0, 0, 0,
-                                                                  0xFF, 0xFF, 0xFF, 0xE0, 0, 0, 1, 0}},
-             {"unlink reply", UsbIp::UnlinkReply{7, -104}, {0, 0, 0, 4, 0, 0, 0, 7, 0,    0,    0,    0,
-                                                            0, 0, 0, 0, 0, 0, 0, 0, 0xFF, 0xFF, 0xFF, 0x98}},
-         }) {
-        Bytes expected = start;
-        expected.resize(48);
+    // Words of 32 bits, most significant byte first; behind these the rest of the twelve is zero.
+    const std::vector<std::tuple<const char*, UsbIp::Packet, std::vector<std::uint32_t>>> cases{
+        {"control out", control, {1, 0x01020304, 0x10002, 0, 0, 0, 8, 0, 0, 0, 0x40C12211, 0x44330800}},
+        {"bulk in", bulkIn, {1, 5, 0x10002, 1, 2, 0x200, 0x10000}},
+        {"unlink", UsbIp::UnlinkPacket{7, 0x10002, 5}, {2, 7, 0x10002, 0, 0, 5}},
+        {"submit reply", UsbIp::SubmitReply{5, -32, 0x100}, {3, 5, 0, 0, 0, 0xFFFFFFE0, 0x100}},
+        {"unlink reply", UsbIp::UnlinkReply{7, -104}, {4, 7, 0, 0, 0, 0xFFFFFF98}},
+    };
+    for (const auto& [name, packet, words] : cases) {
+        Bytes expected(48);
+        for (std::size_t i = 0; i < words.size(); ++i) {
+            Protocol::StoreBig32(&expected[4 * i], words[i]);
+        }
         const UsbIp::PacketBytes bytes = UsbIp::Encode(packet);
         EXPECT_EQ(expected, Part(bytes, 0, 48)) << name;
         EXPECT_EQ(packet, UsbIp::DecodePacket(bytes)) << name;
