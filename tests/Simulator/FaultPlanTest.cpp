@@ -1,5 +1,4 @@
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <stdexcept>
 #include <string>
@@ -52,19 +51,6 @@ TEST(FaultPlanTest, MistakesAreExplained) {
         EXPECT_THAT([text = text] { FaultPlan::Parse(text); },
                     testing::ThrowsMessage<std::invalid_argument>(testing::HasSubstr(explanation)));
     }
-}
-
-TEST(FaultScriptTest, CountsInEachScope) {
-    FaultScript script(FaultPlan::Parse("2:stall; bulk-in 1:empty; control 2+:silent; 5:long"));
-    constexpr std::uint8_t in = Protocol::BulkInEndpoint;
-    constexpr std::uint8_t out = Protocol::BulkOutEndpoint;
-    std::string seen;
-    for (const std::uint8_t endpoint : std::vector<std::uint8_t>{0, in, out, in, 0, 0, 0}) {
-        const auto fault = script.Next(endpoint);
-        seen += fault ? Tests::FaultText(*fault) + "|" : "-|";
-    }
-    EXPECT_EQ("-|-|2:stall|bulk-in 1:empty|-|control 2+:silent|control 2+:silent|", seen);
-    EXPECT_EQ(4U, script.Hits());
 }
 
 }  // namespace

@@ -1,10 +1,7 @@
 #include <gtest/gtest.h>
 
-#include <algorithm>
-
 #include "Protocol/ByteOrder.h"
 #include "SimulatedInstrument.h"
-#include "Simulator/ManualScheduler.h"
 #include "Support/Bytes.h"
 #include "Support/TestTransfer.h"
 
@@ -41,9 +38,8 @@ class SimulatedInstrumentTest : public testing::Test {
         EXPECT_EQ(TransferStatus::Cancelled, transfer.status);
     }
 
-    ManualScheduler scheduler_;
     const std::shared_ptr<SimulatedInstrument> instrument_ =
-        std::make_shared<SimulatedInstrument>(scheduler_);
+        std::make_shared<SimulatedInstrument>(Platform::ClockScheduler());
     const std::shared_ptr<UsbDevice> device_ = SimulatedInstrument::Connect(instrument_);
 };
 
@@ -151,8 +147,7 @@ TEST_F(SimulatedInstrumentTest, UnplugLosesWhatIsVolatile) {
 }
 
 TEST(SimulatedConnectionTest, EachOpeningHasItsOwnClaimAndTransfers) {
-    ManualScheduler scheduler;
-    const auto instrument = std::make_shared<SimulatedInstrument>(scheduler);
+    const auto instrument = std::make_shared<SimulatedInstrument>(Platform::ClockScheduler());
     const auto other = SimulatedInstrument::Connect(instrument);
     TestTransfer pending = TestTransfer::In(BulkInEndpoint, 64);
     TestTransfer ofOther = TestTransfer::In(InterruptInEndpoint, 1);

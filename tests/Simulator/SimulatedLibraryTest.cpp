@@ -1,7 +1,6 @@
 // The library of simulated instruments as a host uses it. The setup is read with the first call of the
 // process.
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <algorithm>
 #include <array>
@@ -9,7 +8,6 @@
 #include <fstream>
 #include <stdexcept>
 #include <string>
-#include <vector>
 
 #include "ostra.h"
 #include "SimulatedSetup.h"

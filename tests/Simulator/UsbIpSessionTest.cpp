@@ -8,7 +8,6 @@
 #include "FaultInjector.h"
 #include "Protocol/Instrument.h"
 #include "SimulatedInstrument.h"
-#include "Simulator/ManualScheduler.h"
 #include "Support/Bytes.h"
 #include "UsbIpSession.h"
 
@@ -79,12 +78,12 @@ class UsbIpSessionTest : public testing::Test {
   protected:
     std::shared_ptr<Platform::Usb::UsbDevice> Device(const std::string& faults = "") {
         return InjectFaults(SimulatedInstrument::Connect(instrument_),
-                            std::make_shared<FaultScript>(FaultPlan::Parse(faults)), scheduler_);
+                            std::make_shared<FaultScript>(FaultPlan::Parse(faults)),
+                            Platform::ClockScheduler());
     }
 
-    ManualScheduler scheduler_;
     const std::shared_ptr<SimulatedInstrument> instrument_ =
-        std::make_shared<SimulatedInstrument>(scheduler_);
+        std::make_shared<SimulatedInstrument>(Platform::ClockScheduler());
     OneRecord exports_;
 };
 
@@ -167,7 +166,8 @@ TEST_F(UsbIpSessionTest, PeerThatDoesNotReadIsNotServedFurther) {
 
     // Nor are the rest of the packets that came together with the one that was too many.
     const InstrumentSettings endless{.scanBytes = std::uint64_t{1} << 40};
-    Peer hungry(SimulatedInstrument::Connect(std::make_shared<SimulatedInstrument>(scheduler_, endless)));
+    Peer hungry(SimulatedInstrument::Connect(
+        std::make_shared<SimulatedInstrument>(Platform::ClockScheduler(), endless)));
     hungry.Vendor(Request::Measure, {});
     hungry.Take();
     Bytes packets;

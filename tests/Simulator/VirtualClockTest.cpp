@@ -1,9 +1,7 @@
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <set>
 #include <string>
-#include <thread>
 
 #include "Platform/EventScheduler.h"
 #include "TestThread.h"
@@ -70,19 +68,6 @@ TEST(VirtualTime, DeadlockIsReportedAtOnce) {
     EXPECT_THAT(report, testing::HasSubstr("(made the clock) waits for a mutex owned by thread "));
     other.Join();
     EXPECT_EQ(ofOther, WaitResult::Failed);
-}
-
-TEST(VirtualTimeDeathTest, WhatCannotGoOnAborts) {
-    const auto waitForNobody = [] {
-        const VirtualClock clock(1);
-        Wait(MakeAutoResetEvent(), Infinite);
-    };
-    EXPECT_DEATH(waitForNobody(), "waits for an event");
-    const auto waitAsAStranger = [] {
-        const VirtualClock clock(1);
-        std::thread([] { SleepMilliseconds(1); }).join();
-    };
-    EXPECT_DEATH(waitAsAStranger(), "must be started by StartThread");
 }
 
 }  // namespace
