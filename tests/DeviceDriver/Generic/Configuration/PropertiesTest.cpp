@@ -1,5 +1,4 @@
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <functional>
 
@@ -19,46 +18,31 @@ using Floats = std::vector<float>;
 
 constexpr const char* InvalidType = "Invalid configuration data type.";
 
-struct Case {
-    const char* name;
-    Property constructed;
-    std::function<Property&(Property&)> assign;
-    PropertyType type;
-    Longs longs;
-    Floats floats;
-    Bytes bigEndian;
-};
-
+/// Made of `value`, and given it in the place of another of any type.
 template <class Value>
-Case Of(const char* name, Value value, PropertyType type, const Longs& longs, const Floats& floats,
-        const Bytes& bigEndian) {
-    const auto assign = [value](Property& target) -> Property& { return target.Assign(value); };
-    return {name, Property(value), assign, type, longs, floats, bigEndian};
+void ExpectHeld(const char* name, Value value, PropertyType type, const Longs& longs, const Floats& floats,
+                const Bytes& bigEndian) {
+    for (Property given : {Property(value), Property(7), Property(1.5F), Property(Longs{1, 2}),
+                           Property(Floats{1.5F, 2.5F}), Property()}) {
+        SCOPED_TRACE(std::string(name) + " over type " + std::to_string(given.GetType()));
+        for (const Property& held : {Property(value), given.Assign(value)}) {
+            EXPECT_EQ(held.GetType(), type);
+            EXPECT_EQ(held.AsLongVector(), longs);
+            EXPECT_EQ(held.AsFloatVector(), floats);
+            EXPECT_EQ(held.SizeOf(), bigEndian.size());
+            EXPECT_EQ(held.AsByteVector(true), bigEndian);
+        }
+    }
 }
 
 TEST(Property, HoldsWhatItWasGivenWhateverWasThere) {
-    const Case cases[] = {
-        Of("8 bits extended", std::int8_t{-3}, TypeLong, {-3}, {}, {0xFF, 0xFF, 0xFF, 0xFD}),
-        Of("16 bits extended", std::int16_t{-2}, TypeLong, {-2}, {}, {0xFF, 0xFF, 0xFF, 0xFE}),
-        Of("32 bits", std::int32_t{0x01020304}, TypeLong, {0x01020304}, {}, {1, 2, 3, 4}),
-        Of("float", 1.0F, TypeFloat, {}, {1.0F}, {0x3F, 0x80, 0, 0}),
-        Of("integers", Longs{1, -1}, TypeLongVector, {1, -1}, {}, {0, 0, 0, 1, 255, 255, 255, 255}),
-        Of("floats", Floats{-2.0F}, TypeFloatVector, {}, {-2.0F}, {0xC0, 0, 0, 0}),
-        Of("no integers", Longs{}, TypeLongVector, {}, {}, {}),
-    };
-    for (const Case& row : cases) {
-        for (const Case& before : cases) {
-            SCOPED_TRACE(std::string(row.name) + " over " + before.name);
-            Property assigned = before.constructed;
-            for (const Property& value : {row.constructed, row.assign(assigned)}) {
-                EXPECT_EQ(value.GetType(), row.type);
-                EXPECT_EQ(value.AsLongVector(), row.longs);
-                EXPECT_EQ(value.AsFloatVector(), row.floats);
-                EXPECT_EQ(value.SizeOf(), row.bigEndian.size());
-                EXPECT_EQ(value.AsByteVector(true), row.bigEndian);
-            }
-        }
-    }
+    ExpectHeld("8 bits extended", std::int8_t{-3}, TypeLong, {-3}, {}, {0xFF, 0xFF, 0xFF, 0xFD});
+    ExpectHeld("16 bits extended", std::int16_t{-2}, TypeLong, {-2}, {}, {0xFF, 0xFF, 0xFF, 0xFE});
+    ExpectHeld("32 bits", std::int32_t{0x01020304}, TypeLong, {0x01020304}, {}, {1, 2, 3, 4});
+    ExpectHeld("float", 1.0F, TypeFloat, {}, {1.0F}, {0x3F, 0x80, 0, 0});
+    ExpectHeld("integers", Longs{1, -1}, TypeLongVector, {1, -1}, {}, {0, 0, 0, 1, 255, 255, 255, 255});
+    ExpectHeld("floats", Floats{-2.0F}, TypeFloatVector, {}, {-2.0F}, {0xC0, 0, 0, 0});
+    ExpectHeld("no integers", Longs{}, TypeLongVector, {}, {}, {});
 }
 
 TEST(Property, BytesRefillTheValueAndKeepTheType) {

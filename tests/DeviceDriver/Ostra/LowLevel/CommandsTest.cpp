@@ -5,7 +5,6 @@
 
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoFunctionality_PC.h"
-#include "Platform/HostQueries.h"
 #include "Platform/ScopedThreadPriority.h"
 #include "Protocol/Instrument.h"
 #include "Protocol/UsbIoDriver.h"
@@ -202,81 +201,65 @@ TEST_P(Commands, SendWhatEarlierCommandsLeftOverTheNativeDriverOnly) {
     ExpectOnTheWire(isNative ? "CF@1234 01" : "CF@0 01");
 }
 
-TEST_P(Commands, EndWithTheTransferThatFails) {
+TEST_P(Commands, EndWithTheTransferThatFailsOrTakesTooLong) {
     const ErrorCode stall = IsNative() ? Errors::GeneralFailure : EndpointHalted;
-    Bytes buffer(65);
+    Bytes buffer(250);
     const auto write = [&](I& i) { i.WriteEEPROM(0, buffer); };
     const auto read = [&](I& i) { i.ReadEEPROM(0, buffer); };
-    // The name that USBIO gives the operation, and which transfer of the place fails; all are behind one
-    // control.
-    const std::vector<
-        std::tuple<const char*, const char*, std::uint32_t, std::size_t, std::function<void(I&)>>>
-        cases{
-            {"out", "ClassOrVendorOutRequest", 0, 0, write},
-            {"in", "ClassOrVendorInRequest", 0, 0, [](I& i) { i.ReadCPLD(a); }},
-            {"measure", "ClassOrVendorOutRequest", 0, 0,
-             [&](I& i) { i.MeasureRequest(buffer.data(), 64, 1); }},
-            {"scan", "ClassOrVendorOutRequest", 0, 0, [](I& i) { i.StartScan(5, 1, 0); }},
-            {"read, data", "ReadSync", In(), 0, read},
-            {"write, data", "WriteSync", Out(), 0, write},
-            {"write, first byte behind", "WriteSync", Out(), 1, write},
-            {"write, second byte behind", "WriteSync", Out(), 2, write},
-        };
-    PellandoFunctionality& instrument = Open();
-    for (const auto& [name, usbIoName, place, failing, run] : cases) {
-        SCOPED_TRACE(name);
-        for (std::size_t i = 0; i < failing; ++i) {
-            driver_.Script(place, {});
-        }
-        driver_.Script(place, {.code = stall, .after = 3});
-        const std::string nativeText = place == 0      ? "Device IO control failed: "
-                                       : place == In() ? "read data failed"
-                                                       : "write data failed";
-        ExpectThrow<IOException>(IsNative()
-                                     ? nativeText + ErrorSuffix(stall)
-                                     : std::string("Error in UsbIo function: \"") + usbIoName +
-                                           "\" Error: Error code 0xE0000030: USBD Error: Endpoint halted.",
-                                 [&] { run(instrument); });
-        EXPECT_EQ(TakeTransfers().size(), place == 0 ? 1 : failing + 2) << "nothing follows a failure";
-        EXPECT_EQ(buffer.size(), 65U);
-    }
-}
-
-TEST_P(Commands, GiveTheirTransfersTheirTime) {
-    if (!clock_.IsVirtual()) {
-        GTEST_SKIP() << "a minute of real time";
-    }
-    Bytes buffer(256);
-    const auto write = [&](I& i) { i.WriteEEPROM(0, buffer); };
+    const auto measure = [&](I& i) { i.MeasureRequest(buffer.data(), 64, 2); };
+    const auto scan = [](I& i) { i.StartScan(5, 2, 0); };
+    const auto countedScan = [](I& i) { i.StartScan(5, 2, 770); };
+    const std::string control = "Device IO control failed: ", scanWait = "WaitForCompletion1";
     constexpr std::uint64_t noEnd = 0;
+    // What the transports say of a stall, with the name that USBIO gives the operation.
     const struct {
-        const char* name;
+        std::string native, usbIo;
         std::function<void(I&)> run;
         std::uint32_t place;
-        std::size_t answeredBefore;
-        std::uint64_t native, usbIo;  ///< milliseconds
+        std::size_t answeredBefore = 0;                         ///< transfers of the place
+        std::uint64_t nativeLimit = noEnd, usbIoLimit = noEnd;  ///< milliseconds without an answer
     } cases[] = {
-        {"measure", [&](I& i) { i.MeasureRequest(buffer.data(), 64, 2); }, In(), 0, 2000 + 5000, 2000 + 5000},
-        {"read", [&](I& i) { i.ReadEEPROM(0, buffer); }, In(), 0, 256 + 5000, 256 + 5000},
-        {"write", write, Out(), 0, 2560 + 5000, noEnd},
-        {"end of a write", write, Out(), 2, 5000, noEnd},
-        {"scan", [](I& i) { i.StartScan(5, 2, 0); }, In(), 0, 2000 + 3000, 256 * 15 + 5000},
-        {"counted scan", [](I& i) { i.StartScan(5, 2, 770); }, In(), 0, 2000 + 3000, 3 * 15 + 5000},
+        {control, "ClassOrVendorOutRequest", write, 0},
+        {control, "ClassOrVendorInRequest", [](I& i) { i.ReadCPLD(a); }, 0},
+        {control, "ClassOrVendorOutRequest", measure, 0},
+        {control, "ClassOrVendorOutRequest", scan, 0},
+        {"read data failed", "ReadSync", measure, In(), 0, 2000 + 5000, 2000 + 5000},
+        {"read data failed", "ReadSync", read, In(), 0, 256 + 5000, 256 + 5000},
+        {"write data failed", "WriteSync", write, Out(), 0, 2500 + 5000},
+        {"write data failed", "WriteSync", write, Out(), 1, 5000},
+        {"write data failed", "WriteSync", write, Out(), 2, 5000},
+        {"Read data failed (OverlappedRead)", scanWait, scan, In(), 0, 2000 + 3000, 256 * 15 + 5000},
+        {"system busy. try again. Read data failed (OverlappedRead - read: 0, expected: 50, remaining: 670)",
+         scanWait, countedScan, In(), 0, 2000 + 3000, 3 * 15 + 5000},
     };
     PellandoFunctionality& instrument = Open();
     for (const auto& row : cases) {
-        SCOPED_TRACE(row.name);
-        const std::uint64_t expected = IsNative() ? row.native : row.usbIo;
-        if (expected == noEnd) {
-            continue;
+        SCOPED_TRACE(testing::Message() << "case " << &row - cases);
+        const bool isScan = row.place == In() && row.usbIo == scanWait;
+        const auto script = [&](const Answer& last) {
+            for (std::size_t i = 0; i < row.answeredBefore; ++i) {
+                driver_.Script(row.place, {});
+            }
+            driver_.Script(row.place, last);
+        };
+        script({.code = stall, .after = 3});
+        ExpectThrow<IOException>(IsNative()
+                                     ? row.native + (isScan ? "" : ErrorSuffix(stall))
+                                     : "Error in UsbIo function: \"" + row.usbIo +
+                                           "\" Error: Error code 0xE0000030: USBD Error: Endpoint halted.",
+                                 [&] { row.run(instrument); });
+        const std::size_t transfers = TakeTransfers().size();
+        EXPECT_TRUE(isScan || transfers == (row.place == 0 ? 1 : row.answeredBefore + 2))
+            << "nothing follows a failure";
+        EXPECT_EQ(buffer.size(), 250U);
+        const std::uint64_t limit = IsNative() ? row.nativeLimit : row.usbIoLimit;
+        if (clock_.IsVirtual() && limit != noEnd) {
+            script({.after = Never});
+            const Stopwatch watch(clock_);
+            EXPECT_THROW(row.run(instrument), IOException);
+            watch.Expect(1 + limit);
         }
-        for (std::size_t i = 0; i < row.answeredBefore; ++i) {
-            driver_.Script(row.place, {});
-        }
-        driver_.Script(row.place, {.after = Never});
-        const Stopwatch watch(clock_);
-        EXPECT_THROW(row.run(instrument), IOException);
-        watch.Expect(1 + expected);
+        TakeTransfers();
         EXPECT_EQ(driver_.Running(row.place), 0U);
     }
 }

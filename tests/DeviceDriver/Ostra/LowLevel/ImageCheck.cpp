@@ -2,6 +2,7 @@
 
 #include <optional>
 #include <stdexcept>
+#include <utility>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
@@ -52,10 +53,7 @@ Bytes BytesOf(PellandoEEPROM& eeprom, const char* section) {
     return bytes;
 }
 
-struct Values {
-    Bytes calibration, log;
-    bool operator==(const Values&) const = default;
-};
+using Values = std::pair<Bytes, Bytes>;  // of calibration and log
 
 Values ValuesOf(PellandoEEPROM& eeprom) {
     return {BytesOf(eeprom, "CalibrationData"), BytesOf(eeprom, "LogData")};

@@ -1,4 +1,3 @@
-#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <limits>
@@ -127,19 +126,12 @@ TEST(PellandoEAT, HeaderDecidesWhetherAndHowFarTheTableIsRead) {
     }
 }
 
-/// Where things move to is seen in images that are read back (`EepromImages`).
-TEST_F(FreshTable, IsFittedWithItsSectionEndsAndBackAgain) {
-    Properties set = PellandoEAT::GetDefaultCalibrationData();
-    set.SetProperty(3013, Property(Longs(3)));
-    table_.EnsureConsistency(set);
-    EXPECT_EQ(EntriesOf(table_), fresh_) << "nothing of the set lies behind its last value";
-    table_.FitSection(set, 0);
-    EXPECT_EQ(table_.AddressOf(2), 4764) << "but the section's end does";
-    table_.FitSection(PellandoEAT::GetDefaultCalibrationData(), 0);
+/// Where things move to otherwise is seen in images that are read back (`EepromImages`).
+TEST_F(FreshTable, StaysBehindTheLastValueOfASetAndWhereAChangeFails) {
+    Properties longer = PellandoEAT::GetDefaultCalibrationData();
+    longer.SetProperty(3013, Property(Longs(3)));
+    table_.EnsureConsistency(longer);
     EXPECT_EQ(EntriesOf(table_), fresh_);
-}
-
-TEST_F(FreshTable, AChangeThatFailsChangesNothing) {
     Properties set;
     set.SetProperty(1000, Property(Longs{1, 2, 3}));
     set.SetProperty(1001, Property(Longs{1, 2, 3}));

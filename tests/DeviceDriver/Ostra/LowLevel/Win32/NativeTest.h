@@ -1,7 +1,5 @@
 #pragma once
 
-#include <memory>
-
 #include "Platform/ErrorCodes.h"
 #include "Protocol/NativeDriver.h"
 #include "Support/DriverTest.h"

@@ -1,5 +1,3 @@
-#include <functional>
-#include <optional>
 
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
 #include "NativeTest.h"

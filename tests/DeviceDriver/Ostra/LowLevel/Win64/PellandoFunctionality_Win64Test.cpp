@@ -1,10 +1,6 @@
 #include <atomic>
-#include <memory>
-#include <optional>
 
 #include "DeviceDriver/Ostra/LowLevel/Win64/PellandoFunctionality_Win64.h"
-#include "Platform/CallFilter.h"
-#include "Platform/HostQueries.h"
 #include "Platform/Time.h"
 #include "Protocol/Instrument.h"
 #include "Protocol/UsbIoDriver.h"
@@ -188,20 +184,6 @@ TEST_F(UsbIoScan, OpenEndedScansGrowAndBeepOnceEach) {
         ASSERT_EQ(Platform::Wait(beeped_.Get(), 10000), Platform::WaitResult::Signalled);
         stopwatch.ExpectBetween(370, 372);
         EXPECT_EQ(beeps_, ++beeps);
-    }
-}
-
-TEST_F(UsbIoScan, AFailureEndsAScanAndLeavesNothing) {
-    for (const Answer& answer :
-         {Answer{.code = Status::EndpointHalted, .after = 3}, Answer{.refusal = Status::EndpointHalted}}) {
-        Send({Whole}, 1);
-        driver_.Script(BulkInEndpoint, answer);
-        ExpectThrow<IOException>(
-            "Error in UsbIo function: \"WaitForCompletion1\" Error: Error code 0xE0000030: USBD Error: "
-            "Endpoint halted.",
-            [&] { instrument_.StartScan(256, 1, 3 * Whole); });
-        EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
-        EXPECT_EQ(TakeAll(), Bytes());
     }
 }
 
