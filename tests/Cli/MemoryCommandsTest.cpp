@@ -188,27 +188,15 @@ TEST_P(MemoryCommandsTest, FilesThatAreMadeReplaceOthersByForceOnly) {
 }
 
 #if !defined(_WIN32)
-/// Standard input is a pipe that holds these bytes and ends.
-class PipedInput final {
-  public:
-    explicit PipedInput(const std::vector<std::uint8_t>& content) {
-        int ends[2];
-        EXPECT_EQ(::pipe(ends), 0);
-        EXPECT_EQ(::write(ends[1], content.data(), content.size()), static_cast<ssize_t>(content.size()));
-        ::close(ends[1]);
-        ::dup2(ends[0], STDIN_FILENO);
-        ::close(ends[0]);
-    }
-    ~PipedInput() {
-        ::dup2(before_, STDIN_FILENO);
-        ::close(before_);
-    }
-    PipedInput(const PipedInput&) = delete;
-    PipedInput& operator=(const PipedInput&) = delete;
-
-  private:
-    const int before_ = ::dup(STDIN_FILENO);
-};
+/// From now on standard input is a pipe that holds these bytes and ends.
+void PipeIntoStandardInput(const std::vector<std::uint8_t>& content) {
+    int ends[2];
+    EXPECT_EQ(::pipe(ends), 0);
+    EXPECT_EQ(::write(ends[1], content.data(), content.size()), static_cast<ssize_t>(content.size()));
+    ::dup2(ends[0], STDIN_FILENO);
+    ::close(ends[0]);
+    ::close(ends[1]);
+}
 
 TEST_P(MemoryCommandsTest, ImagesComeFromStandardInputAndGoToStandardOutput) {
     const EepromImage wanted = Calibrated("5");
@@ -239,7 +227,7 @@ TEST_P(MemoryCommandsTest, ImagesComeFromStandardInputAndGoToStandardOutput) {
              Case{"eeprom restore -", EepromImage(8193), ExitCode::BadData, "more than 8192 bytes"},
              Case{"binary put -", {}, ExitCode::BadData, "it has 0 bytes"},
          }) {
-        const PipedInput input(row.input);
+        PipeIntoStandardInput(row.input);
         SCOPED_TRACE(row.line);
         Fail(row.line, row.code, row.text);
         EXPECT_TRUE(row.out.empty() ? tool_.Out().size() != 8192 : tool_.Out() == row.out);

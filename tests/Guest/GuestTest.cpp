@@ -1,9 +1,6 @@
 // The library on a real Linux kernel: runs inside the virtual machine, where ostra-simulator plugs itself
 // into the kernel's virtual USB host. Everything goes through usbfs and libusb.
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
-#include <signal.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -100,24 +97,6 @@ std::string LastError() {
     return b5ae189db26b2a1b("LastError");
 }
 
-std::string FirstIdentifier() {
-    const auto devices = USBBrowser::Instance()->GetDevices(0);
-    return devices.empty() ? "" : devices.front();
-}
-
-std::vector<std::uint8_t> Scan(PellandoFunctionality& instrument, std::uint32_t record, std::uint32_t total) {
-    instrument.StartScan(record, 2, total);
-    std::vector<std::uint8_t> data;
-    std::vector<std::uint8_t> piece(record);
-    for (std::uint32_t size = record;;) {
-        instrument.GetScanData(piece.data(), size);
-        if (size == 0) {
-            return data;
-        }
-        data.insert(data.end(), piece.begin(), piece.begin() + size);
-    }
-}
-
 class OnKernel : public testing::TestWithParam<bool> {
   protected:
     OnKernel() { Platform::Override64BitHost(GetParam()); }
@@ -129,7 +108,9 @@ INSTANTIATE_TEST_SUITE_P(Transports, OnKernel, testing::Bool(),
 TEST_P(OnKernel, WritesAnImageAndReadsItBackAndLeavesNothingBehind) {
     const PluggedInstrument plugged({});
     const auto image = CountingImage();
-    ASSERT_EQ(f3355d91d5df0e0b(image.data(), FirstIdentifier().c_str()), OSTRA_OK) << LastError();
+    const auto devices = USBBrowser::Instance()->GetDevices(0);
+    ASSERT_EQ(devices.size(), 1U);
+    ASSERT_EQ(f3355d91d5df0e0b(image.data(), devices.front().c_str()), OSTRA_OK) << LastError();
     std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
     const auto before = TestSupport::ResourceCount::TakeSettled();
     ASSERT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_OK) << LastError();
@@ -244,8 +225,7 @@ TEST_P(OnKernel, UnplugsAtTransferAfterTransfer) {
          })},
         {"image write", {{{"control", 32}, {"bulk-out", 96}}}, {}, writesImage},
         {"scan", {{{"control", 1}, {"bulk-in", 4}}}, {"--scan-bytes", "300000"}, withoutException([] {
-             PellandoFunctionality instrument(nullptr, 0);
-             Scan(instrument, 1000, 300000);
+             PellandoFunctionality(nullptr, 0).StartScan(1000, 2, 300000);
          })},
     };
     // From which unplug of the plan on, and how many of them on each transport.

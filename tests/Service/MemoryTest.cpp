@@ -197,63 +197,34 @@ Patch Entry(std::uint32_t index, std::uint16_t id, std::uint32_t address) {
     return {Map::Table + 4 + 6 * index, bytes};
 }
 
+/// An image with errors, and with nothing else, is not sane.
 TEST(ImageCheckTest, FindsWhatIsWrong) {
     const EepromImage erased(8192, 0xFF), noFloat(4, 0xFF), nothing(4);
-    for (const auto& [name, patches, finding, isSane] :
-         std::vector<std::tuple<const char*, std::vector<Patch>, const char*, bool>>{
-             {"erased", {{0, erased}}, "error table: version 65535 instead of 1", false},
-             {"length", {{4098, {1, 43}}}, "error table: length 299 instead of 300 to 512", false},
-             {"between entries",
-              {{4098, {1, 77}}},
-              "warning table: the length does not end with an entry",
-              true},
-             {"main log",
-              {{11, {1}}},
-              "warning log: main copy: checksum 0x00000000 instead of 0x00000001",
-              true},
-             {"used log", {{11, {1}}}, "ok log: the driver uses the second copy", true},
-             {"both logs", {{11, {1}}, {2059, {1}}}, "error log: the driver uses an empty log", false},
-             {"other log",
-              {{2051, {1}}, {2059, {1}}},
-              "note log: the two copies hold different values",
-              true},
-             {"too far",
-              {Entry(26, 1000, 9000)},
-              "error table: values that end outside the image: 1000",
-              false},
-             {"negative",
-              {Entry(0, 10000, 0x80000000)},
-              "error table: values that end outside the image: 10000",
-              false},
-             {"overlap", {Entry(13, 11000, 100)}, "error table: 10010 and 11000 overlap", false},
-             {"over the table", {Entry(54, 2, 4608)}, "error table", false},
-             {"unknown entry", {Entry(27, 1999, 4616)}, "warning table: unknown identifiers: 1999", true},
-             {"missing value", {Entry(27, 1999, 4616)}, "warning table: the calibration lacks 1001", true},
-             {"no checksum",
-              {Entry(0, 1999, 0)},
-              "error table: the driver refuses the image: id 10000 doesn't exist",
-              false},
-             {"log elsewhere",
-              {Entry(11, 10021, 1061)},
-              "error log: the table has it elsewhere than the driver writes it",
-              false},
-             {"second log elsewhere",
-              {Entry(25, 3, 3116)},
-              "warning log: the table has the second copy elsewhere than the driver writes it",
-              true},
-             {"longer log",
-              {Entry(12, 1, 1068), {1064, nothing}},
-              "warning log: it reaches into the binary block",
-              true},
-             {"gap", {Entry(29, 1206, 4632)}, "warning table: calibration values cannot be changed", true},
-             {"repeated", {Entry(28, 1001, 4616)}, "warning table: 1 entries repeat an identifier", true},
-             {"no number", {{4608, noFloat}}, "warning calibration: values that are no numbers: 1000", true},
-             {"binary block", {{1064, {0}}, {4031, {0}}}, "ok binary block: 2 of 1904 bytes used", true},
-             {"words", {{4032, {0}}, {4035, {0}}, {4095, {0}}}, "ok raw words: 2 of 16 used", true},
-             {"rest",
-              {{4756, {0}}, {8191, {0}}},
-              "note rest: 2 bytes behind the calibration data are used",
-              true},
+    for (const auto& [patches, finding] : std::vector<std::tuple<std::vector<Patch>, std::string>>{
+             {{{0, erased}}, "error table: version 65535 instead of 1"},
+             {{{4098, {1, 43}}}, "error table: length 299 instead of 300 to 512"},
+             {{{4098, {1, 77}}}, "warning table: the length does not end with an entry"},
+             {{{11, {1}}}, "warning log: main copy: checksum 0x00000000 instead of 0x00000001"},
+             {{{11, {1}}}, "ok log: the driver uses the second copy"},
+             {{{11, {1}}, {2059, {1}}}, "error log: the driver uses an empty log"},
+             {{{2051, {1}}, {2059, {1}}}, "note log: the two copies hold different values"},
+             {{Entry(26, 1000, 9000)}, "error table: values that end outside the image: 1000"},
+             {{Entry(0, 10000, 0x80000000)}, "error table: values that end outside the image: 10000"},
+             {{Entry(13, 11000, 100)}, "error table: 10010 and 11000 overlap"},
+             {{Entry(54, 2, 4608)}, "error table"},
+             {{Entry(27, 1999, 4616)}, "warning table: unknown identifiers: 1999"},
+             {{Entry(27, 1999, 4616)}, "warning table: the calibration lacks 1001"},
+             {{Entry(0, 1999, 0)}, "error table: the driver refuses the image: id 10000 doesn't exist"},
+             {{Entry(11, 10021, 1061)}, "error log: the table has it elsewhere than the driver writes it"},
+             {{Entry(25, 3, 3116)},
+              "warning log: the table has the second copy elsewhere than the driver writes it"},
+             {{Entry(12, 1, 1068), {1064, nothing}}, "warning log: it reaches into the binary block"},
+             {{Entry(29, 1206, 4632)}, "warning table: calibration values cannot be changed"},
+             {{Entry(28, 1001, 4616)}, "warning table: 1 entries repeat an identifier"},
+             {{{4608, noFloat}}, "warning calibration: values that are no numbers: 1000"},
+             {{{1064, {0}}, {4031, {0}}}, "ok binary block: 2 of 1904 bytes used"},
+             {{{4032, {0}}, {4035, {0}}, {4095, {0}}}, "ok raw words: 2 of 16 used"},
+             {{{4756, {0}}, {8191, {0}}}, "note rest: 2 bytes behind the calibration data are used"},
          }) {
         EepromImage image = FreshImage();
         for (const auto& [address, bytes] : patches) {
@@ -261,8 +232,8 @@ TEST(ImageCheckTest, FindsWhatIsWrong) {
         }
         const std::vector<ImageFinding> findings = CheckImage(image);
         const std::string text = Lines(findings);
-        EXPECT_NE(text.find(finding), std::string::npos) << name << ":\n" << text;
-        EXPECT_EQ(IsSane(findings), isSane) << name << ":\n" << text;
+        EXPECT_NE(text.find(finding), std::string::npos) << finding << " is not in:\n" << text;
+        EXPECT_EQ(IsSane(findings), !finding.starts_with("error")) << text;
     }
 }
 

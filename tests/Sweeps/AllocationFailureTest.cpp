@@ -1,13 +1,15 @@
 // The first, second, third... allocation of a call fails, until one gets by without a failure.
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include <array>
+#include <atomic>
 #include <cstdio>
+#include <cstdlib>
 #include <functional>
 #include <iterator>
 #include <memory>
 #include <mutex>
+#include <new>
 #include <string>
 #include <thread>
 #include <utility>
@@ -21,17 +23,71 @@
 #include "Protocol/Instrument.h"
 #include "Support/ResourceCount.h"
 #include "Support/SimulatedHost.h"
-#include "Sweeps/FailingAllocator.h"
 #include "UsbIo/CUsbIoReader.h"
 #include "UsbIo/CUsbIoWriter.h"
 #include "Utilities/Multithreading/Condition.h"
 #include "VirtualClock.h"
+
+namespace {
+
+/// Allocations until the one that fails; 0 while none is to fail.
+std::atomic<long> untilFailure = 0;
+std::atomic<bool> hasFailed = false;
+thread_local int exempt = 0;
+
+void* Allocate(std::size_t size) {
+    if (exempt == 0 && untilFailure.load(std::memory_order_relaxed) != 0 && untilFailure.fetch_sub(1) == 1) {
+        hasFailed = true;
+        return nullptr;
+    }
+    return std::malloc(size == 0 ? 1 : size);
+}
+
+}  // namespace
+
+// The forms for arrays stand on these, but for sanitizers, which have theirs.
+void* operator new(std::size_t size) {
+    if (void* const memory = Allocate(size)) {
+        return memory;
+    }
+    throw std::bad_alloc();
+}
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
+    return Allocate(size);
+}
+void operator delete(void* memory) noexcept {
+    std::free(memory);
+}
+void operator delete(void* memory, std::size_t) noexcept {
+    std::free(memory);
+}
 
 namespace Varnholt::Tests {
 namespace {
 
 using Platform::Usb::UsbDevice;
 using TestSupport::ResourceCount;
+
+/// While it lives, the allocations of this thread neither fail nor count. The simulated instrument, the bus
+/// and a test itself are not what is tested.
+class Exempt final {
+  public:
+    Exempt() { ++exempt; }
+    ~Exempt() { --exempt; }
+    Exempt(const Exempt&) = delete;
+    Exempt& operator=(const Exempt&) = delete;
+};
+
+/// Lets the allocation fail that is `number` from now, counted from 1, on whatever thread.
+void FailAllocation(long number) {
+    hasFailed = false;
+    untilFailure = number;
+}
+/// No allocation fails any more. Answers whether one has failed since `FailAllocation`.
+bool StopFailing() {
+    untilFailure = 0;
+    return hasFailed;
+}
 
 /// A device whose own allocations do not fail.
 class ExemptDevice final : public UsbDevice {

@@ -1,6 +1,5 @@
 #include <array>
 #include <cstdio>
-#include <map>
 #include <span>
 #include <string>
 

@@ -1,14 +1,13 @@
 #include "StandInDriver.h"
 
-#include <setupapi.h>
 #include <shlwapi.h>
 
 #include <algorithm>
-#include <array>
 #include <cstdio>
 #include <functional>
 #include <stdexcept>
 
+#include "Platform/DeviceFiles.h"
 #include "Protocol/NativeDriver.h"
 #include "Protocol/UsbIoDriver.h"
 
@@ -127,24 +126,8 @@ std::uint64_t StandInDriver::SeedOf(const std::string& path) const {
 }
 
 std::vector<std::string> StandInDriver::List() {
-    const Protocol::Guid& interfaceClass =
-        HostIs64Bit() ? Protocol::UsbIoDriver::InterfaceClass : Protocol::NativeDriver::InterfaceClass;
-    const auto* guid = reinterpret_cast<const GUID*>(&interfaceClass);
-    const HDEVINFO list = SetupDiGetClassDevsA(guid, nullptr, nullptr, DIGCF_PRESENT | DIGCF_DEVICEINTERFACE);
-    std::vector<std::string> paths;
-    SP_DEVICE_INTERFACE_DATA record{};
-    record.cbSize = sizeof record;
-    for (DWORD index = 0; SetupDiEnumDeviceInterfaces(list, nullptr, guid, index, &record); ++index) {
-        std::array<char, 1024> buffer{};
-        auto* detail = reinterpret_cast<SP_DEVICE_INTERFACE_DETAIL_DATA_A*>(buffer.data());
-        detail->cbSize = sizeof *detail;
-        if ((record.Flags & SPINT_ACTIVE) != 0 &&
-            SetupDiGetDeviceInterfaceDetailA(list, &record, detail, buffer.size(), nullptr, nullptr)) {
-            paths.emplace_back(detail->DevicePath);
-        }
-    }
-    SetupDiDestroyDeviceInfoList(list);
-    return paths;
+    return Platform::SystemDeviceFiles().ListInterfaces(
+        HostIs64Bit() ? Protocol::UsbIoDriver::InterfaceClass : Protocol::NativeDriver::InterfaceClass);
 }
 
 Instrument::Instrument(const std::string& path)

@@ -1,7 +1,5 @@
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
-#include <memory>
 #include <sstream>
 #include <vector>
 
@@ -127,22 +125,6 @@ TEST(Exceptions, VerboseTextShowsTheTraceAndASnapshotOfTheCause) {
         EXPECT_EQ(recorded.what(), "bad allocation\n\tB" + expected);
         SetVerboseText(false);
     }
-}
-
-TEST(SmartPointer, SharesAndReleases) {
-    struct Owner {
-        std::shared_ptr<int> owned;
-    };
-    const auto owned = std::make_shared<int>();
-    {
-        Tools::SmartPointer<Owner> first(new Owner{owned});
-        Tools::SmartPointer<Owner> second(first);
-        second = *&second;
-        first = Tools::SmartPointer<Owner>();
-        EXPECT_TRUE(first.IsEmpty());
-        EXPECT_EQ(second->owned.use_count(), 2);
-    }
-    EXPECT_EQ(owned.use_count(), 1);
 }
 
 TEST(LexicalCast, RefusesWhatDoesNotBeginWithTheTarget) {

@@ -1,5 +1,4 @@
 // Mutexes, semaphores and conditions.
-#include <chrono>
 #include <functional>
 #include <limits>
 #include <memory>
