@@ -91,13 +91,13 @@ function(ostra_shipped TARGET FILE DESCRIPTION)
     BYPRODUCTS ${FILE}.debug VERBATIM)
 endfunction()
 
-# ostra_test(NAME SOURCES ... [LINK ...] [EXACT_TIME ...] [WAITS_LONG] [ONE_THREAD]): a GoogleTest program, run by ctest
-# as one test under its name. What has ONE_THREAD only is nothing for ThreadSanitizer. Where there is no virtual time, on
-# Windows, the cases are left out that EXACT_TIME names (as in --gtest_filter), because their outcome hangs on
+# ostra_test(NAME SOURCES ... [LINK ...] [EXACT_TIME ...] [WAITS_LONG] [ONE_THREAD] [OWN_NAMES]): a GoogleTest program,
+# run by ctest as one test under its name. What has ONE_THREAD only is nothing for ThreadSanitizer. A program with OWN_NAMES
+# gives its instruments names that no other's have, and so need not wait for others. Where there is no virtual time, on Windows, the cases are left out that EXACT_TIME names (as in --gtest_filter), because their outcome hangs on
 # milliseconds or they take minutes, and a program that WAITS_LONG runs as several tests side by side, each with its share
 # of the cases.
 function(ostra_test NAME)
-  cmake_parse_arguments(ARG "WAITS_LONG;ONE_THREAD" "" "SOURCES;LINK;EXACT_TIME" ${ARGN})
+  cmake_parse_arguments(ARG "WAITS_LONG;ONE_THREAD;OWN_NAMES" "" "SOURCES;LINK;EXACT_TIME" ${ARGN})
   ostra_program(${NAME} SOURCES ${ARG_SOURCES} LINK ${ARG_LINK} ostra_gtest $<$<TARGET_EXISTS:ostra_virtual_time>:ostra_virtual_time>)
   target_include_directories(${NAME} PRIVATE "${PROJECT_SOURCE_DIR}/tests" "${PROJECT_SOURCE_DIR}/simulator")
   set_target_properties(${NAME} PROPERTIES OSTRA_IS_TEST ON)
@@ -130,7 +130,7 @@ function(ostra_test NAME)
   set_tests_properties(${NAME} PROPERTIES TIMEOUT 500 SKIP_RETURN_CODE 77)
   # The native transport locks an instrument for the whole machine, by its path: tests of it wait for each other.
   foreach(LIBRARY IN ITEMS ostra_native ostra_browser ostra_interface ostra_service ostra_cli)
-    if(LIBRARY IN_LIST ARG_LINK)
+    if(LIBRARY IN_LIST ARG_LINK AND NOT ARG_OWN_NAMES)
       set_tests_properties(${NAME} PROPERTIES RESOURCE_LOCK instruments)
     endif()
   endforeach()

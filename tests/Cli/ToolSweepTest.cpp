@@ -18,6 +18,7 @@ using namespace Simulator;
 using Bytes = std::vector<std::uint8_t>;
 using Files = std::map<std::string, Bytes>;
 
+constexpr const char* Instrument = "swept";
 constexpr std::uint32_t RecordSize = 5000;
 constexpr std::uint8_t ControlEndpoint = 0;
 
@@ -98,13 +99,14 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
     Result Run(const FaultPlan& plan) const {
         const TestClock clock(TestTime::Virtual, 1);
         SimulatedHost host(transport_);
-        auto& instrument = host.Add(
-            "sim", {.scanBytes = command_.recording != nullptr ? 30 * RecordSize : Protocol::ReadoutBytes});
+        auto& instrument =
+            host.Add(Instrument,
+                     {.scanBytes = command_.recording != nullptr ? 30 * RecordSize : Protocol::ReadoutBytes});
         ToolRunner tool;
         const TestFolder& folder = tool.folder;
         WriteFile(folder.Path("image"), ImageToWrite());
         WriteFile(folder.Path("block"), Bytes(Service::BinaryBlockOf(ImageToWrite()).size(), 0x3C));
-        const auto script = host.Bus().SetFaults("sim", plan);
+        const auto script = host.Bus().SetFaults(Instrument, plan);
         Result result;
         result.filesBefore = FilesIn(folder);
         result.memoryBefore = instrument.Eeprom();
@@ -118,7 +120,7 @@ class ToolSweep : public testing::TestWithParam<std::tuple<Transport, std::size_
         result.hits = script->Hits();
         EXPECT_EQ(instrument.PendingTransfers(), 0U);
         EXPECT_FALSE(instrument.Claimed());
-        host.Bus().SetFaults("sim", {});
+        host.Bus().SetFaults(Instrument, {});
         instrument.PlugIn();
         EXPECT_TRUE(result.code == ExitCode::Success || tool.Run("reset") == ExitCode::Success) << tool.Err();
         return result;

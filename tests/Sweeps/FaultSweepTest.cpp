@@ -254,7 +254,7 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
     std::vector<RecordedTransfer> Undisturbed() {
         const TestClock clock(TestTime::Virtual, 1);
         SimulatedHost host(transport_);
-        host.Add("one");
+        host.Add("struck");
         Simulator::TransferRecorder recorder;
         host.Bus().WrapDevices([&](const std::string&, auto device) { return recorder.Record(device); });
         beforeModelsEnd = [&] { toldTransfers_ = recorder.Count(); };
@@ -268,8 +268,8 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
         const TestClock clock(TestTime::Virtual, fault.index + 1);
         const Stopwatch stopwatch(clock);
         SimulatedHost host(transport_);
-        auto& instrument = host.Add("one");
-        const auto script = host.Bus().SetFaults("one", FaultPlan({fault}));
+        auto& instrument = host.Add("struck");
+        const auto script = host.Bus().SetFaults("struck", FaultPlan({fault}));
         if (operation_.check) {
             instrument.SetEeprom(operation_.eeprom);
         }
@@ -289,7 +289,7 @@ class FaultSweep : public testing::TestWithParam<std::tuple<Transport, std::size
         }
 
         // The next open works, or says that the device is gone.
-        host.Bus().SetFaults("one", {});
+        host.Bus().SetFaults("struck", {});
         if (!instrument.PluggedIn()) {
             EXPECT_THROW(PellandoFunctionality(nullptr, 0), DeviceDriverException);
             instrument.PlugIn();
