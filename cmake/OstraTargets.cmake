@@ -1,6 +1,6 @@
 # One place that says how this project's code is compiled; every target goes through one of these helpers.
 
-option(OSTRA_WERROR "Take the compiler's warnings for errors, as ./check does" OFF)
+option(OSTRA_WERROR "Take the compiler's warnings for errors, as ./check does" "$ENV{OSTRA_WERROR}")
 option(OSTRA_SYMBOLS "Compile line numbers in, for the files of symbols beside what is shipped" "${WIN32}")
 set(OSTRA_SANITIZE "" CACHE STRING "Sanitizers to build with, as in -fsanitize= (empty: none)")
 set(CMAKE_CXX_STANDARD 20)
