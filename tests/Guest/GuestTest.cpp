@@ -109,7 +109,7 @@ TEST_P(OnKernel, WritesAnImageAndReadsItBackAndLeavesNothingBehind) {
     const PluggedInstrument plugged({});
     const auto image = CountingImage();
     const auto devices = USBBrowser::Instance()->GetDevices(0);
-    ASSERT_EQ(devices.size(), 1U);
+    ASSERT_FALSE(devices.empty());
     ASSERT_EQ(f3355d91d5df0e0b(image.data(), devices.front().c_str()), OSTRA_OK) << LastError();
     std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
     const auto before = TestSupport::ResourceCount::TakeSettled();
