@@ -4,7 +4,6 @@
 #include <memory>
 #include <new>
 #include <string>
-#include <utility>
 
 #include "Platform/Linux/Clock.h"
 #include "Platform/Linux/SharedFile.h"

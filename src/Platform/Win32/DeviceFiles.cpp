@@ -1,6 +1,5 @@
 #include "Platform/DeviceFiles.h"
 
-#include <cstddef>
 
 #include "Platform/CallFilter.h"
 #include "Platform/HostQueries.h"

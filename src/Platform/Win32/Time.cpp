@@ -1,8 +1,5 @@
 #include "Platform/Time.h"
 
-#include <utility>
-
-#include "Platform/RealScheduler.h"
 #include "Platform/Win32/Windows.h"
 
 namespace Varnholt::Platform {
@@ -52,13 +49,6 @@ CalendarTime LocalCalendarTime(std::int64_t seconds) {
 
 void SoundSystemBeep(std::uint32_t hertz, std::uint32_t milliseconds) {
     ::Beep(hertz, milliseconds);
-}
-
-EventScheduler& ClockScheduler() {
-    // Never destroyed: that would be at the unloading of a library, when no thread can be waited for.
-    static auto& scheduler =
-        *new RealScheduler([](std::function<void()> run) { return std::thread(std::move(run)); });
-    return scheduler;
 }
 
 }  // namespace Varnholt::Platform
