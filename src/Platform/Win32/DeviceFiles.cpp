@@ -1,6 +1,5 @@
 #include "Platform/DeviceFiles.h"
 
-
 #include "Platform/CallFilter.h"
 #include "Platform/HostQueries.h"
 #include "Platform/Win32/RegistryInterfaces.h"
