@@ -45,6 +45,13 @@ TEST(HostProcess, EndsInAForkedChildWhileAnEventIsAwaited) {
     EventScheduler& scheduler = ClockScheduler();
     scheduler.CallAt(
         scheduler.Now() + 60'000'000, [] {}, this);
+    // AddressSanitizer's heap stays locked in the child if the scheduler's thread uses it at the moment of
+    // the fork.
+    const OwnedHandle begun(MakeAutoResetEvent());
+    scheduler.CallAt(
+        scheduler.Now(), [&] { SignalEvent(begun.Get()); }, &begun);
+    ASSERT_EQ(Wait(begun.Get(), LongTimeout), WaitResult::Signalled);
+    scheduler.Forget(&begun);
     ForkedProcess child([]() -> int {
         alarm(20);
         std::exit(7);
