@@ -16,8 +16,16 @@
 namespace Varnholt::Platform {
 namespace {
 
-/// Long enough for threads that said what they do next to have done it.
-constexpr std::uint32_t SettlingTime = 40;
+/// Long enough for threads that said what they do next to have done it, on a busy machine as well.
+constexpr std::uint32_t SettlingTime = 200;
+
+/// Returns when that many threads have counted themselves and gone on to what they do next.
+void LetSettle(const std::atomic<int>& begun, int threadCount) {
+    while (begun < threadCount) {
+        SleepMilliseconds(1);
+    }
+    SleepMilliseconds(SettlingTime);
+}
 
 std::string NameFor(const char* purpose) {
     return UniqueName(std::string("{") + purpose + "}#");
@@ -28,15 +36,17 @@ INSTANTIATE_FOR_EACH_CLOCK(Waits);
 
 /// Ends the threads that wait for an object by as many `signals`, and expects that it had no more.
 void ExpectOneWaitPerSignal(Handle object, int threadCount, const std::function<void()>& signals) {
+    std::atomic<int> begun = 0;
     std::atomic<int> ended = 0;
     std::deque<TestThread> threads;
     for (int i = 0; i < threadCount; ++i) {
         threads.emplace_back([&] {
+            ++begun;
             EXPECT_EQ(Wait(object, LongTimeout), WaitResult::Signalled);
             ++ended;
         });
     }
-    SleepMilliseconds(SettlingTime);
+    LetSettle(begun, threadCount);
     signals();
     threads.clear();
     EXPECT_EQ(ended, threadCount);
@@ -138,10 +148,12 @@ TEST_P(Waits, EndWithWhicheverObjectComesFirstAndOutlastAClosedHandle) {
     const OwnedHandle second(MakeAutoResetEvent());
     OwnedHandle third(MakeAutoResetEvent());
     WaitAnyResult outcome{};
+    std::atomic<int> begun = 0;
     TestThread waiting([&, closed = third.Get()] {
+        ++begun;
         outcome = WaitAny(std::array{first.Get(), second.Get(), closed}, LongTimeout);
     });
-    SleepMilliseconds(SettlingTime);
+    LetSettle(begun, 1);
     third.Reset();
     SleepMilliseconds(1);
     SignalEvent(second.Get());
