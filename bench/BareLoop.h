@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <vector>
 
+#include "Platform/Handle.h"
 #include "Platform/Usb/UsbDevice.h"
 #include "Platform/WaitableObjects.h"
 
@@ -23,10 +24,9 @@ class BareLoop final : private Platform::Usb::TransferClient {
     void Read(std::uint64_t total, std::vector<std::uint8_t>& result);
 
   private:
-    struct Chunk {
-        Platform::Usb::Transfer transfer;
+    struct Chunk : Platform::Usb::Transfer {
         std::vector<std::uint8_t> bytes = std::vector<std::uint8_t>(ChunkSize);
-        Platform::Handle completed = Platform::MakeAutoResetEvent();
+        const Platform::OwnedHandle completed{Platform::MakeAutoResetEvent()};
     };
 
     void TransferCompleted(Platform::Usb::Transfer& transfer) noexcept override;

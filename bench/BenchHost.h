@@ -1,7 +1,5 @@
 #pragma once
 
-#include <chrono>
-#include <functional>
 #include <memory>
 #include <optional>
 #include <utility>
@@ -11,6 +9,7 @@
 #include "Platform/HostQueries.h"
 #include "Platform/Time.h"
 #include "SimulatedBus.h"
+#include "Timing.h"
 
 namespace Varnholt::Bench {
 
@@ -39,11 +38,5 @@ class BenchHost final {
     const std::unique_ptr<Platform::DeviceFileSystem> files_ = Platform::Drivers::MakeDriverFileSystem(bus_);
     const Platform::ScopedDeviceFiles inForce_{*files_};
 };
-
-inline double Seconds(const std::function<void()>& action) {
-    const auto begin = std::chrono::steady_clock::now();
-    action();
-    return std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count();
-}
 
 }  // namespace Varnholt::Bench

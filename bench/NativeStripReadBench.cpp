@@ -1,18 +1,12 @@
 #include <benchmark/benchmark.h>
 
-#include <chrono>
-#include <functional>
-#include <memory>
 #include <vector>
 
 #include "BareLoop.h"
+#include "BenchHost.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
-#include "Platform/Drivers/DriverFileSystem.h"
-#include "Platform/EventScheduler.h"
-#include "Platform/Time.h"
 #include "Protocol/Instrument.h"
 #include "Protocol/NativeDriver.h"
-#include "SimulatedBus.h"
 
 namespace Varnholt::Bench {
 namespace {
@@ -29,12 +23,6 @@ Protocol::NativeDriver::ControlBlock MeasureBlock() {
     return block;
 }
 
-double Seconds(const std::function<void()>& action) {
-    const auto begin = std::chrono::steady_clock::now();
-    action();
-    return std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count();
-}
-
 /// Strip reads of the native transport, without the fixed pause of the command before them, against the bare
 /// loop on the same device, alternately. Arguments: bytes in all, device speed in bytes per second (0: as
 /// fast as it can), 1 for an open-ended scan.
@@ -44,18 +32,13 @@ void NativeStripRead(benchmark::State& state) {
     Simulator::InstrumentSettings settings;
     settings.scanBytes = total;
     settings.bytesPerSecond = static_cast<std::uint64_t>(state.range(1));
-    Simulator::SimulatedBus bus(Platform::ClockScheduler());
-    bus.Add("bench", settings);
-    const auto drivers = Platform::Drivers::MakeDriverFileSystem(bus);
-    const Platform::ScopedDeviceFiles inForce(*drivers);
-    Platform::ObserveBeeps([](std::uint32_t, std::uint32_t) {});
+    BenchHost host(false, settings);
 
     double bare = 0;
     double native = 0;
     for (auto _ : state) {
         {
-            Platform::ErrorCode error = 0;
-            const auto device = bus.Open("bench", error);
+            const auto device = host.Open();
             BareLoop loop(*device);
             std::vector<std::uint8_t> result;
             bare += Seconds([&] { loop.Read(isOpenEnded ? 0 : total, result); });
@@ -73,7 +56,6 @@ void NativeStripRead(benchmark::State& state) {
         native += scan;
         state.SetIterationTime(scan);
     }
-    Platform::ObserveBeeps({});
     state.SetBytesProcessed(state.iterations() * static_cast<std::int64_t>(total));
     const double records = static_cast<double>(state.iterations()) * total / RecordSize;
     state.counters["of_bare"] = bare / native;

@@ -2,7 +2,6 @@
 #include <fmt/format.h>
 #include <fmt/ostream.h>
 
-#include <ctime>
 #include <fstream>
 #include <vector>
 
@@ -13,18 +12,13 @@
 #include "SensorModel.h"
 #include "Service/Interruption.h"
 #include "Service/ScanRecorder.h"
+#include "Timing.h"
 
 namespace Varnholt::Bench {
 namespace {
 
 constexpr std::size_t RecordSize = 256;
 constexpr std::size_t TransferSize = 65536;
-
-double CpuSeconds() {
-    timespec time{};
-    clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &time);
-    return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_nsec) * 1e-9;
-}
 
 std::vector<std::uint8_t> Transfer() {
     const Simulator::SensorModel sensor(1, 1, 1);

@@ -2,7 +2,6 @@
 
 #include <array>
 #include <chrono>
-#include <ctime>
 #include <fstream>
 #include <string>
 #include <thread>
@@ -86,12 +85,6 @@ BENCHMARK(UsbIoScan)
     ->ArgsProduct({{16 * MegaByte}, {HighSpeed}, {0, 1}})
     ->UseManualTime()
     ->Unit(benchmark::kMillisecond);
-
-double CpuSeconds() {
-    timespec time{};
-    clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &time);
-    return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_nsec) * 1e-9;
-}
 
 /// Processor time of one command, all threads together, beyond what its pause takes: going to sleep and
 /// waking up, most of all in a virtual machine.

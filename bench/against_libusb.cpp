@@ -9,7 +9,6 @@
 
 #include <algorithm>
 #include <array>
-#include <chrono>
 #include <cstdint>
 #include <cstdlib>
 #include <exception>
@@ -21,8 +20,11 @@
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
 #include "ostra.h"
 #include "Platform/HostQueries.h"
+#include "Timing.h"
 
 namespace {
+
+using Varnholt::Bench::Seconds;
 
 std::vector<double> BareSeconds(const std::string& arguments) {
     std::vector<double> all;
@@ -33,12 +35,6 @@ std::vector<double> BareSeconds(const std::string& arguments) {
         pclose(program);
     }
     return all.empty() ? throw std::runtime_error("bare_libusb " + arguments + " failed") : all;
-}
-
-double Seconds(const std::function<void()>& action) {
-    const auto start = std::chrono::steady_clock::now();
-    action();
-    return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
 }
 
 double Median(std::vector<double> all) {

@@ -87,13 +87,14 @@ void Scan(libusb_context* context, libusb_device_handle* device, std::size_t tot
     Command(device, Request::Measure, {});
     std::size_t asked = 0;
     std::size_t received = 0;
-    for (Chunk& chunk : chunks) {
+    const auto startNext = [&](Chunk& chunk) {
         const std::size_t length = std::min<std::size_t>(ChunkSize, total - asked);
         if (length > 0) {
             Start(device, chunk, BulkInEndpoint, length);
             asked += length;
         }
-    }
+    };
+    std::ranges::for_each(chunks, startNext);
     for (std::size_t current = 0; received < total; current ^= 1) {
         Chunk& chunk = chunks[current];
         Await(context, chunk);
@@ -103,11 +104,7 @@ void Scan(libusb_context* context, libusb_device_handle* device, std::size_t tot
         const auto moved = static_cast<std::size_t>(chunk.transfer->actual_length);
         std::copy_n(chunk.bytes.begin(), moved, result.get() + received);
         received += moved;
-        const std::size_t length = std::min<std::size_t>(ChunkSize, total - asked);
-        if (length > 0) {
-            Start(device, chunk, BulkInEndpoint, length);
-            asked += length;
-        }
+        startNext(chunk);
     }
 }
 

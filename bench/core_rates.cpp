@@ -1,9 +1,7 @@
 // What the C++ core does in the same time as the Python package: readouts and a scan on a simulated
 // instrument in this process. usage: core_rates native|usbio READOUTS RECORDS BYTES_PER_SECOND; prints
 // seconds a readout, bytes a second. Run in turns with the package by python_rates.py.
-#include <chrono>
 #include <cstdlib>
-#include <ctime>
 #include <functional>
 #include <iostream>
 #include <numeric>
@@ -19,11 +17,6 @@
 namespace {
 
 using namespace Varnholt;
-using Clock = std::chrono::steady_clock;
-
-double SecondsSince(Clock::time_point start) {
-    return std::chrono::duration<double>(Clock::now() - start).count();
-}
 
 /// Makes values of the records and adds them up, as the package and the other side of the comparison do.
 struct Summing {
@@ -59,21 +52,22 @@ int main(int count, char** arguments) {
     Service::OpenedInstrument instrument(context, FindInstrument(context, {}));
     PrepareMeasurement(instrument, {});
 
-    auto start = Clock::now();
-    const std::clock_t startClock = std::clock();
+    const double cpuBefore = Bench::CpuSeconds();
     std::int32_t last = 0;
-    for (std::uint64_t i = 0; i < number(2); ++i) {
-        last += TakeReadout(instrument).Values()[64];
-    }
+    const double took = Bench::Seconds([&] {
+        for (std::uint64_t i = 0; i < number(2); ++i) {
+            last += TakeReadout(instrument).Values()[64];
+        }
+    });
     const auto readouts = static_cast<double>(number(2));
-    std::cout << SecondsSince(start) / readouts << ' '
-              << static_cast<double>(std::clock() - startClock) / CLOCKS_PER_SEC / readouts;
+    std::cout << took / readouts << ' ' << (Bench::CpuSeconds() - cpuBefore) / readouts;
 
     Summing sink;
     Service::ScanReport report;
     const auto total = static_cast<std::uint32_t>(settings.scanBytes);
-    start = Clock::now();
-    RunScan(instrument, {Protocol::ReadoutBytes, total, 5}, std::ref(sink), report);
-    std::cout << ' ' << static_cast<double>(total) / SecondsSince(start) << '\n';
+    const double scanned = Bench::Seconds([&] {
+        RunScan(instrument, {Protocol::ReadoutBytes, total, 5}, std::ref(sink), report);
+    });
+    std::cout << ' ' << static_cast<double>(total) / scanned << '\n';
     return last == 0 && sink.sum == 0 ? 1 : 0;
 }
