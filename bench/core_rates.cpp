@@ -46,7 +46,9 @@ int main(int count, char** arguments) {
 
     Service::Observer observer;
     Service::Interruption interruption;
-    Service::Context context(observer, interruption);
+    Service::InterruptibleDeviceFiles files(Platform::DeviceFiles());
+    const Platform::ScopedDeviceFiles inForce(files);
+    Service::Context context(observer, interruption, files);
     context.ChooseTransport(isUsbIo ? Service::Context::Transport::UsbIo
                                     : Service::Context::Transport::Native);
     Service::OpenedInstrument instrument(context, FindInstrument(context, {}));

@@ -31,7 +31,9 @@ void Session::CarryOut() {
     if (verbose) {
         log = [this](const std::string& line) { streams_.log << Name + line + '\n'; };
     }
-    context_.emplace(*this, interruption_, std::move(log));
+    files_.emplace(Platform::DeviceFiles(), std::move(log));
+    filesInForce_.emplace(*files_);
+    context_.emplace(*this, interruption_, *files_);
     interruption_.ThrowIfRequested();  // one that came before
     action();
     FlushOut();

@@ -88,7 +88,9 @@ class Session final : public Service::Observer {
     Streams& streams_;
     Service::Interruption& interruption_;
     std::unique_ptr<TrafficRecording> recording_;
-    std::optional<Service::Context> context_;  // stands on the recording's files
+    std::optional<Service::InterruptibleDeviceFiles> files_;  // stand on the recording's
+    std::optional<Platform::ScopedDeviceFiles> filesInForce_;
+    std::optional<Service::Context> context_;
     bool outIsClaimed_ = false;
     bool inIsClaimed_ = false;
 };

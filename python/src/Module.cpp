@@ -95,7 +95,7 @@ auto WithAllInstruments(const std::string& transport, Work work) {
     Host::Instance().CheckUsable();
     Observer observer;
     Interruption interruption;
-    Context context(observer, interruption, Host::Instance().Files(), {});
+    Context context(observer, interruption, Host::Instance().Files());
     interruption.SetAction({});
     context.ChooseTransport(TransportOf(transport));
     try {

@@ -21,19 +21,11 @@ bool IsOwn(const std::exception_ptr& exception) {
 
 }  // namespace
 
-Context::Context(Observer& toldObserver, Interruption& userInterruption, InterruptibleDeviceFiles::Log log)
+Context::Context(Observer& toldObserver, Interruption& userInterruption, InterruptibleDeviceFiles& usedFiles,
+                 std::string deviceIdentifier)
     : observer_(toldObserver),
       interruption_(userInterruption),
-      ownFiles_(std::make_unique<OwnFiles>(std::move(log))),
-      files_(ownFiles_->files) {
-    interruption_.SetAction([this] { files_.Interrupt(device_); });
-}
-
-Context::Context(Observer& toldObserver, Interruption& userInterruption,
-                 InterruptibleDeviceFiles& sharedFiles, std::string deviceIdentifier)
-    : observer_(toldObserver),
-      interruption_(userInterruption),
-      files_(sharedFiles),
+      files_(usedFiles),
       device_(std::move(deviceIdentifier)) {
     interruption_.SetAction([this] { files_.Interrupt(device_); });
 }
@@ -43,9 +35,8 @@ Context::~Context() {
 }
 
 void Context::Sleep(std::uint32_t milliseconds) const {
-    if (!interruption_.Sleep(milliseconds)) {
-        interruption_.ThrowIfRequested();
-    }
+    interruption_.Sleep(milliseconds);
+    interruption_.ThrowIfRequested();
 }
 
 Failure Context::Explain(const std::exception_ptr& exception, const std::string& identifier) const {

@@ -1,6 +1,5 @@
 #pragma once
 
-#include <memory>
 #include <optional>
 #include <string>
 
@@ -18,14 +17,10 @@ class Context final {
   public:
     using Transport = DeviceDriver::Ostra::Transport;
 
-    /// Both must outlive the object. For its life the device files that were in force can be interrupted, and
-    /// an interruption does that; `log`, where there is one, is told of their transfers.
-    Context(Observer& toldObserver, Interruption& userInterruption, InterruptibleDeviceFiles::Log log = {});
-    /// The same for one instrument of several that are used at the same time: `sharedFiles` are in force
-    /// already, outlive the object too, and an interruption ends what runs on the device with this
-    /// identifier.
-    Context(Observer& toldObserver, Interruption& userInterruption, InterruptibleDeviceFiles& sharedFiles,
-            std::string deviceIdentifier);
+    /// All must outlive the object. The files are in force; an interruption ends what runs on the device with
+    /// this identifier, and without one on all devices.
+    Context(Observer& toldObserver, Interruption& userInterruption, InterruptibleDeviceFiles& usedFiles,
+            std::string deviceIdentifier = {});
     ~Context();
     Context(const Context&) = delete;
     Context& operator=(const Context&) = delete;
@@ -48,17 +43,8 @@ class Context final {
     Failure Explain(const std::exception_ptr& exception, const std::string& identifier = {}) const;
 
   private:
-    struct OwnFiles {
-        explicit OwnFiles(InterruptibleDeviceFiles::Log log)
-            : files(Platform::DeviceFiles(), std::move(log)) {}
-
-        InterruptibleDeviceFiles files;
-        const Platform::ScopedDeviceFiles inForce{files};
-    };
-
     Observer& observer_;
     Interruption& interruption_;
-    const std::unique_ptr<OwnFiles> ownFiles_;
     InterruptibleDeviceFiles& files_;
     const std::string device_;  ///< empty: all
     std::optional<Transport> chosenTransport_;

@@ -54,7 +54,8 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
         SCOPED_TRACE(row.name);
         const TestClock clock(TestTime::Virtual);
         ScriptedDriver driver(row.devices);
-        const Platform::ScopedDeviceFiles inForce(driver);
+        Service::InterruptibleDeviceFiles files(driver);
+        const Platform::ScopedDeviceFiles inForce(files);
         Platform::Override64BitHost(row.is64Bit);
         Bytes information(12);
         Protocol::StoreLittle16(&information[0], row.version);
@@ -67,7 +68,7 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
         driver.enumerationFailure = row.enumeration;
         Service::Observer nobody;
         Service::Interruption never;
-        Service::Context context(nobody, never);
+        Service::Context context(nobody, never, files);
         ExpectFindings(Service::DiagnoseDrivers(context), row.levels, row.text, row.fix, row.failure);
         Platform::Override64BitHost(std::nullopt);
     }
