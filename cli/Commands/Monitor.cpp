@@ -26,16 +26,18 @@ void Print(Session& session, const Service::InstrumentEvent& event, bool asJson)
 }
 
 void Monitor(Session& session, const MonitorOptions& options) {
-    Service::EventWatch watch(session.Context(), ChooseInstrument(session, options));
-    session.Note("watching " + watch.Identifier() + "; Ctrl-C ends");
+    Service::EventMailbox mailbox;
+    Service::OpenedInstrument instrument(session.Context(), ChooseInstrument(session, options), &mailbox);
+    Service::EventReader events(mailbox, instrument);
+    session.Note("watching " + instrument.Identifier() + "; Ctrl-C ends");
     for (;;) {
-        while (const auto event = watch.Events().Next()) {
+        while (const auto event = events.Next()) {
             Print(session, *event, options.json);
             if (event->kind == Service::EventKind::Removed) {
                 return;
             }
         }
-        const bool isOver = options.seconds > 0 && watch.Events().Seconds() >= options.seconds;
+        const bool isOver = options.seconds > 0 && events.Seconds() >= options.seconds;
         if (isOver || !session.UserInterruption().Sleep(LookInterval)) {
             return;
         }

@@ -64,10 +64,6 @@ std::optional<InstrumentEvent> EventReader::Next() {
     return event;
 }
 
-void EventReader::Wait(std::uint32_t milliseconds) const {
-    Platform::Wait(arrived_.Get(), milliseconds);
-}
-
 /// The end of the messages looks like a removal, whatever ended them.
 bool EventReader::IsRemoved() const {
     for (int look = 0; look < LooksForAGoneOne; ++look) {

@@ -50,7 +50,7 @@ class EventReader final {
     /// is still connected.
     std::optional<InstrumentEvent> Next();
     /// Returns when something came since the last wait, or after that time.
-    void Wait(std::uint32_t milliseconds) const;
+    void Wait(std::uint32_t milliseconds) const { Platform::Wait(arrived_.Get(), milliseconds); }
 
   private:
     friend class EventMailbox;
@@ -67,20 +67,6 @@ class EventReader final {
     const Platform::OwnedHandle arrived_;
     std::uint64_t start_ = 0;
     std::deque<Message> waiting_;
-};
-
-/// Watches the button and the removal of an instrument, which it opens.
-class EventWatch final {
-  public:
-    EventWatch(Context& context, const FoundInstrument& found) : instrument_(context, found, &mailbox_) {}
-
-    const std::string& Identifier() const { return instrument_.Identifier(); }
-    EventReader& Events() { return events_; }
-
-  private:
-    EventMailbox mailbox_;
-    OpenedInstrument instrument_;
-    EventReader events_{mailbox_, instrument_};
 };
 
 }  // namespace Varnholt::Service
