@@ -32,17 +32,18 @@ constexpr const char* UnpluggedAdvice = "plug it in again; `ostra list` shows wh
 constexpr const char* InUseMessage = "the instrument is used by another process";
 constexpr const char* InUseAdvice = "end the other program: an instrument belongs to one process at a time";
 constexpr const char* NoPermissionMessage = "no permission to open the instrument";
+constexpr const char* NoPermissionAdvice = "`ostra doctor` names the reason and the fix";
 constexpr const char* SilentMessage = "the instrument did not answer in time";
 constexpr const char* SilentAdvice = "unplug it and plug it in again, then try once more";
+constexpr const char* TransferAdvice = "try again; if it stays, `ostra doctor`";
 constexpr std::uint32_t AcquiredExclusively = 0xE0001020;
 constexpr std::uint32_t BusTimeout = 0xE0006000;
 
-const std::array Meanings{
+constexpr std::array Meanings{
     CodeMeaning{Errors::Busy, FailureKind::InUse, InUseMessage, InUseAdvice},
     CodeMeaning{Status::OpenedByOtherProcess, FailureKind::InUse, InUseMessage, InUseAdvice},
     CodeMeaning{AcquiredExclusively, FailureKind::InUse, InUseMessage, InUseAdvice},
-    CodeMeaning{Errors::AccessDenied, FailureKind::NoPermission, NoPermissionMessage,
-                SystemAdvice::NoPermission},
+    CodeMeaning{Errors::AccessDenied, FailureKind::NoPermission, NoPermissionMessage, NoPermissionAdvice},
     CodeMeaning{Errors::FileNotFound, FailureKind::Unplugged, UnpluggedMessage, UnpluggedAdvice},
     CodeMeaning{Errors::DeviceNotConnected, FailureKind::Unplugged, UnpluggedMessage, UnpluggedAdvice},
     CodeMeaning{Status::DeviceRemoved, FailureKind::Unplugged, UnpluggedMessage, UnpluggedAdvice},
@@ -59,9 +60,7 @@ constexpr std::string_view MissingLockText = "handle is NULL";
 
 std::string Tidy(std::string text) {
     // A Windows system text ends with a line break of its own.
-    for (std::size_t at = 0; (at = text.find_first_of("\r\n", at)) != std::string::npos;) {
-        text.erase(at, 1);
-    }
+    std::erase_if(text, [](char c) { return c == '\r' || c == '\n'; });
     return text;
 }
 
@@ -79,10 +78,9 @@ Failure OfTransfer(const DeviceDriver::Generic::Utilities::DeviceDriverException
     if (const auto missing = exception.MissingData()) {
         const std::string counts = fmt::format("{} of {} bytes came", missing->moved, missing->asked);
         return {FailureKind::ShortData, text == counts ? counts : WithReason(counts.c_str(), text),
-                SystemAdvice::TransferFailed, text};
+                TransferAdvice, text};
     }
-    return {FailureKind::TransferFailed, WithReason("a transfer failed", text), SystemAdvice::TransferFailed,
-            text};
+    return {FailureKind::TransferFailed, WithReason("a transfer failed", text), TransferAdvice, text};
 }
 
 Failure OfLibrary(FailureKind kind, const Utilities::Exceptions::TraceableException& exception) {

@@ -3,6 +3,7 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+#include <iterator>
 #include <string_view>
 
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
@@ -86,7 +87,7 @@ FoundInstrument FindInstrument(Context& context, const std::string& name) {
 
 std::size_t FindInstrument(const std::vector<std::string>& identifiers, const std::string& name) {
     if (identifiers.empty()) {
-        throw Failure(FailureKind::NotFound, "no instrument is connected", SystemAdvice::NoneIsFound);
+        throw Failure(FailureKind::NotFound, "no instrument is connected", NoInstrumentAdvice);
     }
     if (name.empty()) {
         return 0;
@@ -103,11 +104,8 @@ std::size_t FindInstrument(const std::vector<std::string>& identifiers, const st
     };
     for (const Fits fits : ways) {
         std::vector<std::string> found;
-        for (const std::string& identifier : identifiers) {
-            if (fits(identifier, name)) {
-                found.push_back(identifier);
-            }
-        }
+        std::ranges::copy_if(identifiers, std::back_inserter(found),
+                             [&](const std::string& identifier) { return fits(identifier, name); });
         if (found.size() > 1) {
             throw Failure(FailureKind::NotFound, "'" + name + "' fits several instruments",
                           fmt::format("name one of them: {}", fmt::join(found, ", ")));

@@ -8,11 +8,8 @@
 /// What the user can do next, and be told, with this system's means.
 namespace Varnholt::Service {
 
-namespace SystemAdvice {
-extern const char* const NoneIsFound;
-extern const char* const NoPermission;
-extern const char* const TransferFailed;
-}  // namespace SystemAdvice
+/// Where no instrument is found.
+extern const char* const NoInstrumentAdvice;
 
 /// Why the system refuses the lock of an instrument, and what to do: `code` is what `MakeMutex` left.
 Failure DescribeMissingLock(Platform::ErrorCode code);

@@ -41,12 +41,8 @@ constexpr Reason Reasons[] = {
 
 }  // namespace
 
-namespace SystemAdvice {
-const char* const NoneIsFound =
+const char* const NoInstrumentAdvice =
     "`ostra doctor` looks for the reason; `ostra-simulator` simulates an instrument";
-const char* const NoPermission = "`ostra doctor` names the reason and the fix";
-const char* const TransferFailed = "try again; if it stays, `ostra doctor`";
-}  // namespace SystemAdvice
 
 Failure DescribeMissingLock(Platform::ErrorCode code) {
     const auto* const known = std::ranges::find(Reasons, code, &Reason::code);

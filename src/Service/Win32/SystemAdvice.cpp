@@ -6,11 +6,7 @@
 
 namespace Varnholt::Service {
 
-namespace SystemAdvice {
-const char* const NoneIsFound = "`ostra doctor` looks for the reason";
-const char* const NoPermission = "`ostra doctor` names the reason and the fix";
-const char* const TransferFailed = "try again; if it stays, `ostra doctor`";
-}  // namespace SystemAdvice
+const char* const NoInstrumentAdvice = "`ostra doctor` looks for the reason";
 
 Failure DescribeMissingLock(Platform::ErrorCode code) {
     return {FailureKind::NoLock,
