@@ -17,7 +17,7 @@ void ScanRecorder::Receive(std::span<const std::uint8_t> data) {
 }
 
 void ScanRecorder::Take(std::span<const std::uint8_t> data) {
-    milliseconds_ = time_.Milliseconds();
+    const std::uint64_t milliseconds = time_.Milliseconds();
     report_.received += data.size();
     std::vector<std::uint8_t>& begun = report_.leftOver;
     if (!begun.empty()) {
@@ -27,20 +27,16 @@ void ScanRecorder::Take(std::span<const std::uint8_t> data) {
         if (begun.size() < recordSize_) {
             return;
         }
-        PassOn(begun);
+        sink_(begun, milliseconds);
         begun.clear();
     }
     const auto whole = data.first(data.size() / recordSize_ * recordSize_);
-    PassOn(whole);
+    if (!whole.empty()) {
+        sink_(whole, milliseconds);
+    }
     data = data.subspan(whole.size());
     begun.assign(data.begin(), data.end());
     progress_.Update(report_.received);
-}
-
-void ScanRecorder::PassOn(std::span<const std::uint8_t> records) {
-    if (!records.empty()) {
-        sink_(records, milliseconds_);
-    }
 }
 
 }  // namespace Varnholt::Service

@@ -39,14 +39,12 @@ class ScanRecorder final : public DeviceDriver::Ostra::LowLevel::ScanReceiver {
 
   private:
     void Take(std::span<const std::uint8_t> data);
-    void PassOn(std::span<const std::uint8_t> records);
 
     const std::uint32_t recordSize_;
     const RecordSink& sink_;
     ScanReport& report_;  ///< its rest is a record that is not whole yet
     Progress& progress_;
     ElapsedTime time_;
-    std::uint64_t milliseconds_ = 0;  ///< when the transfer came
     std::exception_ptr failure_;
 };
 

@@ -80,6 +80,14 @@ class Checker final {
         findings_.push_back({severity, area, std::move(text)});
     }
 
+    /// The properties that something is wrong with, if there are any.
+    void AddListed(Severity severity, const char* area, const char* lead,
+                   const std::vector<std::uint16_t>& ids) {
+        if (!ids.empty()) {
+            Add(severity, area, lead + Listed(ids));
+        }
+    }
+
     bool CheckHeader() {
         const std::uint16_t version = Protocol::LoadBig16(&image_[Map::Table + Layout::Version]);
         const std::uint16_t length = Protocol::LoadBig16(&image_[Map::Table + Layout::Length]);
@@ -110,20 +118,17 @@ class Checker final {
                 unknown.push_back(id);
             }
         }
-        const auto length = Protocol::LoadBig16(&image_[Map::Table + Layout::Length]);
-        std::size_t written = 0;
-        for (std::uint32_t at = Layout::FirstEntry; at < length && at + Layout::EntrySize <= Map::TableArea;
-             at += Layout::EntrySize) {
-            ++written;
-        }
+        // An entry that the length cuts off counts, and one that the area cuts off does not.
+        const std::uint32_t length = Protocol::LoadBig16(&image_[Map::Table + Layout::Length]);
+        const std::size_t written =
+            std::min((length - Layout::FirstEntry + Layout::EntrySize - 1) / Layout::EntrySize,
+                     (Map::TableArea - Layout::FirstEntry) / Layout::EntrySize);
         Add(Severity::Fine, TableArea, fmt::format("{} entries", entries.GetItemCount()));
         if (written > entries.GetItemCount()) {
             Add(Severity::Warning, TableArea,
                 fmt::format("{} entries repeat an identifier", written - entries.GetItemCount()));
         }
-        if (!unknown.empty()) {
-            Add(Severity::Warning, TableArea, "unknown identifiers: " + Listed(unknown));
-        }
+        AddListed(Severity::Warning, TableArea, "unknown identifiers: ", unknown);
         ReportMissing(entries, PellandoEAT::GetDefaultLogData(), 0, "the log lacks ");
         ReportMissing(entries, PellandoEAT::GetDefaultLogData(), Map::LogCopyIdOffset,
                       "the second copy of the log lacks ");
@@ -138,9 +143,7 @@ class Checker final {
                 missing.push_back(id);
             }
         }
-        if (!missing.empty()) {
-            Add(Severity::Warning, TableArea, lead + Listed(missing));
-        }
+        AddListed(Severity::Warning, TableArea, lead, missing);
     }
 
     /// Where the values lie: inside the image, with their usual size, and none over another.
@@ -169,18 +172,13 @@ class Checker final {
             }
             places.push_back({id, first, first + size});
         }
-        if (!outside.empty()) {
-            Add(Severity::Error, TableArea, "values that end outside the image: " + Listed(outside));
-        }
-        if (!unusual.empty()) {
-            Add(Severity::Warning, TableArea, "values of another size than usual: " + Listed(unusual));
-        }
+        AddListed(Severity::Error, TableArea, "values that end outside the image: ", outside);
+        AddListed(Severity::Warning, TableArea, "values of another size than usual: ", unusual);
         ReportOverlaps(std::move(places));
     }
 
     void ReportOverlaps(std::vector<Place> places) {
-        std::sort(places.begin(), places.end(),
-                  [](const Place& a, const Place& b) { return a.first < b.first; });
+        std::ranges::sort(places, {}, &Place::first);
         const Place* reaching = nullptr;  // of those so far, the one that reaches furthest
         for (const Place& place : places) {
             if (reaching != nullptr && place.first < reaching->end && place.end > place.first) {
@@ -258,18 +256,15 @@ class Checker final {
         std::size_t untouched = 0;
         for (const auto& [id, value] : calibration.GetDatastore()) {
             const std::vector<double> numbers = NumbersOf(value);
-            if (!std::all_of(numbers.begin(), numbers.end(),
-                             [](double number) { return std::isfinite(number); })) {
+            if (!std::ranges::all_of(numbers, [](double number) { return std::isfinite(number); })) {
                 odd.push_back(id);
             }
-            const bool isUntouched =
-                std::all_of(numbers.begin(), numbers.end(), [](double number) { return number == -1; });
-            untouched += isUntouched ? std::size_t{1} : std::size_t{0};
+            if (std::ranges::all_of(numbers, [](double number) { return number == -1; })) {
+                ++untouched;
+            }
         }
         Add(Severity::Fine, CalibrationArea, fmt::format("{} values", calibration.GetItemCount()));
-        if (!odd.empty()) {
-            Add(Severity::Warning, CalibrationArea, "values that are no numbers: " + Listed(odd));
-        }
+        AddListed(Severity::Warning, CalibrationArea, "values that are no numbers: ", odd);
         if (untouched > 0) {
             Add(Severity::Note, CalibrationArea,
                 fmt::format("{} values are -1, as in a fresh instrument", untouched));
@@ -312,8 +307,7 @@ std::string UseOfBinaryBlock(const EepromImage& image) {
 }
 
 bool IsSane(const std::vector<ImageFinding>& findings) {
-    return std::none_of(findings.begin(), findings.end(),
-                        [](const ImageFinding& finding) { return finding.severity == Severity::Error; });
+    return std::ranges::find(findings, Severity::Error, &ImageFinding::severity) == findings.end();
 }
 
 std::string ErrorsOf(const std::vector<ImageFinding>& findings) {

@@ -50,18 +50,6 @@ Properties ImageModel::LoadSet(const char* name) {
     return memory_->Load(set);
 }
 
-Properties ImageModel::Calibration() {
-    return LoadSet("CalibrationData");
-}
-
-Properties ImageModel::Log() {
-    return LoadSet("LogData");
-}
-
-Properties ImageModel::Table() {
-    return LoadSet("EATData");
-}
-
 bool HaveSameBytes(const Properties& a, const Properties& b) {
     return std::ranges::equal(a.GetDatastore(), b.GetDatastore(), [](const auto& one, const auto& other) {
         return one.first == other.first && one.second.AsByteVector(true) == other.second.AsByteVector(true);

@@ -23,9 +23,9 @@ class ImageModel final {
     /// The copy, with what the model has written to it so far.
     const EepromImage& Contents() const { return contents_; }
 
-    Properties Calibration();
-    Properties Log();
-    Properties Table();
+    Properties Calibration() { return LoadSet("CalibrationData"); }
+    Properties Log() { return LoadSet("LogData"); }
+    Properties Table() { return LoadSet("EATData"); }
 
   private:
     Properties LoadSet(const char* name);

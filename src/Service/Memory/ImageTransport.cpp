@@ -28,10 +28,6 @@ void ImageTransport::ReadEEPROM(const Bytes4& address, const Bytes2&, std::uint8
     std::copy_n(Place(address, count), count, data);
 }
 
-void ImageTransport::GetDeviceIdentifier(std::string& identifier) {
-    identifier.clear();
-}
-
 void ImageTransport::Refuse() {
     throw IOException("an image file knows no other commands than those of its EEPROM", Here());
 }

@@ -43,7 +43,7 @@ class ImageTransport final : public DeviceDriver::Ostra::LowLevel::PellandoFunct
     }
     void GetMISC(std::uint8_t&, Bytes2&, std::uint8_t&, Bytes2&, Bytes2&) override { Refuse(); }
     void GetChipID(std::uint8_t*) override { Refuse(); }
-    void GetDeviceIdentifier(std::string& identifier) override;
+    void GetDeviceIdentifier(std::string& identifier) override { identifier.clear(); }
 
   private:
     [[noreturn]] static void Refuse();

@@ -42,8 +42,7 @@ constexpr std::array Meanings{
 };
 
 const Meaning* MeaningOf(std::uint16_t id) {
-    const auto* const found = std::find_if(Meanings.begin(), Meanings.end(),
-                                           [id](const Meaning& meaning) { return meaning.id == id; });
+    const auto* const found = std::ranges::find(Meanings, id, &Meaning::id);
     return found == Meanings.end() ? nullptr : found;
 }
 
