@@ -3,27 +3,14 @@
 #include "Utilities/Files/FileError.h"
 
 namespace Varnholt::Cli {
-namespace {
 
-using std::filesystem::path;
 using Utilities::Files::FileError;
 using Utilities::Files::FinalName;
-
-path PartialFor(const FinalName& name) {
-    path partial;
-    if (name.CanBeReplaced()) {
-        partial = name.Path();
-        partial += ".part";
-    }
-    return partial;
-}
-
-}  // namespace
 
 RecordingFile::RecordingFile(const std::string& name, const Service::Interruption& userInterruption)
     : finalName_(name),
       interruption_(userInterruption),
-      partial_(PartialFor(finalName_)),
+      partial_(finalName_.Beside(".part")),
       descriptor_(Open()) {}
 
 OutputDescriptor RecordingFile::Open() {

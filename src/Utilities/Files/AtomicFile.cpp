@@ -22,14 +22,9 @@ AtomicFile::AtomicFile(const std::string& name, IfItExists policy) : finalName_(
     if (finalName_.Existed() && ifItExists_ == IfItExists::Refuse) {
         FailAsItExists();
     }
-    Files::path written = name;
-    if (finalName_.CanBeReplaced()) {
-        partial_ = finalName_.Path();
-        partial_ += ".part" + std::to_string(std::random_device{}());
-        written = partial_;
-    }
+    partial_ = finalName_.Beside(".part" + std::to_string(std::random_device{}()));
     errno = 0;
-    stream_.open(written, std::ios::binary | std::ios::trunc);
+    stream_.open(partial_.empty() ? Files::path(name) : partial_, std::ios::binary | std::ios::trunc);
     if (!stream_) {
         partial_.clear();
         finalName_.Fail(ReasonOfLastFailure());
@@ -37,7 +32,7 @@ AtomicFile::AtomicFile(const std::string& name, IfItExists policy) : finalName_(
 }
 
 AtomicFile::~AtomicFile() {
-    if (!committed_ && !partial_.empty()) {
+    if (!partial_.empty()) {
         stream_.close();
         std::error_code ignored;
         Files::remove(partial_, ignored);
@@ -68,7 +63,7 @@ void AtomicFile::Commit() {
     if (!partial_.empty() && !finalName_.Give(partial_, ifItExists_)) {
         FailAsItExists();
     }
-    committed_ = true;
+    partial_.clear();
 }
 
 void AtomicFile::FailAsItExists() const {

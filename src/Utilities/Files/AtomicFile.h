@@ -36,9 +36,8 @@ class AtomicFile final {
 
     const FinalName finalName_;
     const IfItExists ifItExists_;
-    std::filesystem::path partial_;  ///< empty: written directly
+    std::filesystem::path partial_;  ///< empty: written directly, or committed
     std::ofstream stream_;
-    bool committed_ = false;
 };
 
 void WriteFileAtomically(const std::string& name, std::span<const std::uint8_t> content,

@@ -43,6 +43,10 @@ FinalName::FinalName(const std::string& name) : shownName_(name), target_(name) 
     }
 }
 
+Files::path FinalName::Beside(const std::string& suffix) const {
+    return isOrdinary_ ? Files::path(target_) += suffix : Files::path();
+}
+
 bool FinalName::Give(const Files::path& partial, IfItExists policy) const {
     std::error_code error;
     if (policy == IfItExists::Refuse) {

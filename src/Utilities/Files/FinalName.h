@@ -15,10 +15,9 @@ class FinalName final {
     explicit FinalName(const std::string& name);
 
     const std::string& Shown() const { return shownName_; }
-    /// Through links: a link stays, what it points to is replaced.
-    const std::filesystem::path& Path() const { return target_; }
-    /// False for what can only be written to directly: a device, a pipe.
-    bool CanBeReplaced() const { return isOrdinary_; }
+    /// For the file that is to take the name: this name, through links, with `suffix` behind it. Empty for
+    /// what can only be written to directly: a device, a pipe.
+    std::filesystem::path Beside(const std::string& suffix) const;
     /// Whether something had the name when the object was made.
     bool Existed() const { return existed_; }
 
