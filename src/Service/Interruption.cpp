@@ -7,8 +7,6 @@
 
 namespace Varnholt::Service {
 
-Interruption::Interruption() : event_(Platform::MakeAutoResetEvent()) {}
-
 void Interruption::Request() {
     requested_ = true;
     Platform::SignalEvent(event_.Get());

@@ -13,7 +13,7 @@ namespace Varnholt::Service {
 /// thread that runs the command.
 class Interruption final {
   public:
-    Interruption();
+    Interruption() = default;
     Interruption(const Interruption&) = delete;
     Interruption& operator=(const Interruption&) = delete;
 
@@ -47,7 +47,7 @@ class Interruption final {
   private:
     std::atomic<bool> requested_{false};
     std::atomic<int> deferrals_{0};
-    Platform::OwnedHandle event_;
+    const Platform::OwnedHandle event_{Platform::MakeAutoResetEvent()};
     Platform::RecursiveMutex section_;  ///< guards `action_`
     std::function<void()> action_;
 };

@@ -5,15 +5,14 @@
 
 namespace Varnholt::Utilities::Exceptions {
 
-Cause::Cause(const std::exception& snapshotOf)
-    : type_(&typeid(snapshotOf)), message_(snapshotOf.what()), isEmpty_(false) {
+Cause::Cause(const std::exception& snapshotOf) : type_(&typeid(snapshotOf)), message_(snapshotOf.what()) {
     if (const auto* traceable = dynamic_cast<const TraceableException*>(&snapshotOf)) {
         trace_ = traceable->GetTrace();
     }
 }
 
 std::string Cause::Text() const {
-    if (isEmpty_) {
+    if (IsEmpty()) {
         return {};
     }
     std::string text = "\ncaused by: " + Tools::ReadableName(*type_) + ": " + message_ + "\n";

@@ -17,7 +17,7 @@ class Cause : public std::exception {
 
     const char* what() const noexcept override { return message_.c_str(); }
 
-    bool IsEmpty() const noexcept { return isEmpty_; }
+    bool IsEmpty() const noexcept { return type_ == nullptr; }
 
     /// Writes "\ncaused by: ", the type, ": ", the message and a newline, then each trace entry on a line of
     /// its own behind a tab.
@@ -29,7 +29,6 @@ class Cause : public std::exception {
     const std::type_info* type_ = nullptr;
     std::list<std::string> trace_;
     std::string message_;
-    bool isEmpty_ = true;
 };
 
 }  // namespace Varnholt::Utilities::Exceptions

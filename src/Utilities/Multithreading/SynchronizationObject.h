@@ -28,7 +28,7 @@ class SynchronizationObject : public TryLockable {
         virtual Platform::Handle GetHandle() = 0;
     };
 
-    explicit SynchronizationObject(std::unique_ptr<Impl> owned);
+    explicit SynchronizationObject(std::unique_ptr<Impl> owned) : impl_(owned.release()) {}
 
     void Lock() override { impl_->Lock(); }
     void Unlock() override { impl_->Unlock(); }

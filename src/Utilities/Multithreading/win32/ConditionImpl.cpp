@@ -132,6 +132,8 @@ bool ConditionImpl::Wait(std::int32_t) try {
 }
 TRACED
 
+Condition::Condition(Mutex& mutex) : impl_(CreateConditionImpl(mutex)) {}
+
 Tools::SmartPointer<Condition::Impl> CreateConditionImpl(Mutex& mutex) {
     return Tools::SmartPointer<Condition::Impl>(new ConditionImpl(mutex));
 }
