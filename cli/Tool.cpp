@@ -1,8 +1,9 @@
 #include "Tool.h"
 
+#include <fmt/format.h>
+
 #include <algorithm>
 #include <CLI/CLI.hpp>
-#include <numeric>
 #include <set>
 #include <sstream>
 
@@ -46,9 +47,7 @@ class HelpFormatter final : public CLI::Formatter {
         for (const CLI::Option* const other : option->get_excludes()) {
             names.insert(other->get_name());
         }
-        return std::accumulate(
-            names.begin(), names.end(), text.substr(0, at) + label,
-            [](const std::string& before, const std::string& name) { return before + " " + name; });
+        return fmt::format("{}{} {}", text.substr(0, at), label, fmt::join(names, " "));
     }
     std::string make_option(const CLI::Option* option, bool isPositional) const override {
         if (!isPositional || option->get_lnames().empty()) {

@@ -1,5 +1,6 @@
 #include "Commands/MeasurementOutput.h"
 
+#include "Output/ProgressLine.h"
 #include "Output/RecordingFile.h"
 #include "Output/StreamOutput.h"
 
@@ -21,10 +22,6 @@ std::unique_ptr<RecordOutput> MakeRecordOutput(Session& session, const std::stri
         SetStandardOutputBinary();
     }
     return std::make_unique<StreamOutput>(session.Out());
-}
-
-std::string CountText(std::uint64_t count, const std::string& noun) {
-    return std::to_string(count) + " " + noun + (count == 1 ? "" : "s");
 }
 
 EarlyEnd EndEarly(const Session& session, RecordOutput& output, const std::string& noun, bool discard) {

@@ -14,9 +14,6 @@ bool GoesToFile(const std::string& output);
 /// Where the records go. To be made before the instrument is opened: what cannot be written is found first.
 std::unique_ptr<RecordOutput> MakeRecordOutput(Session& session, const std::string& output, bool isRaw);
 
-/// "1 record", "12 records"
-std::string CountText(std::uint64_t count, const std::string& noun);
-
 /// How a measurement ended that did not come to its end.
 struct EarlyEnd {
     Failure failure;   ///< says what became of the records

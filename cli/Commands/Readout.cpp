@@ -11,6 +11,7 @@
 #include "Commands/MeasurementOutput.h"
 #include "Output/Json.h"
 #include "Output/LiveBlock.h"
+#include "Output/ProgressLine.h"
 #include "Output/WallTimeText.h"
 #include "Service/ElapsedTime.h"
 
@@ -59,14 +60,14 @@ constexpr const char* ReadoutNoun = "readout";
 /// Puts readouts into the form that the user asked for.
 class Formatter final {
   public:
-    Formatter(Session& usedSession, const ReadoutOptions& chosen, std::string identifier)
+    Formatter(Session& usedSession, const ReadoutOptions& chosen, std::string identifier,
+              const Service::MeasurementFacts& measurement)
         : session_(usedSession),
           options_(chosen),
           instrument_(std::move(identifier)),
+          facts_(measurement),
           isDrawnOver_(!GoesToFile(options_.output) && session_.OutFacts().isTerminal),
           block_(session_.OutFacts()) {}
-
-    void SetFacts(const Service::MeasurementFacts& measurement) { facts_ = measurement; }
 
     /// What stands before the first readout.
     std::string Head() const {
@@ -129,9 +130,9 @@ class Formatter final {
     Session& session_;
     const ReadoutOptions& options_;
     const std::string instrument_;
+    const Service::MeasurementFacts facts_;
     const bool isDrawnOver_;
     LiveBlock block_;
-    Service::MeasurementFacts facts_;
 };
 
 /// Waits until it is due, so many milliseconds after the first, and takes it.
@@ -172,11 +173,10 @@ void TakeSeries(Session& session, Service::OpenedInstrument& instrument, const R
 void TakeInto(RecordOutput& output, Session& session, const ReadoutOptions& options) {
     auto instrument = OpenInstrument(session, options);
     const Service::MeasurementSettings settings = options.measurement.Settings();
-    Formatter formatter(session, options, instrument.Identifier());
     PrepareMeasurement(instrument, settings);
-    if (options.json || options.csv) {
-        formatter.SetFacts(FactsOf(instrument, settings));
-    }
+    const bool areFactsShown = options.json || options.csv;
+    Formatter formatter(session, options, instrument.Identifier(),
+                        areFactsShown ? FactsOf(instrument, settings) : Service::MeasurementFacts{});
     Service::ElapsedTime time;
     TakeSeries(session, instrument, options, formatter, output, time);
     output.Complete();

@@ -42,26 +42,22 @@ struct PutWordOptions : MemoryOptions {
 };
 
 void PutWord(Session& session, const PutWordOptions& options) {
-    struct Word {
-        std::uint16_t id;
-        std::uint32_t value;
-    };
-    std::vector<Word> words;
+    std::vector<std::pair<std::uint16_t, std::uint32_t>> words;
     for (const Assignment& assignment : ParseAssignments(options.assignments)) {
         const auto value = ParseNumber<std::uint32_t>(assignment.value);
         if (!value) {
             throw Failure(FailureKind::BadArgument, "'" + assignment.value + "' is no 32-bit number",
                           "for example 10200=0x01020304");
         }
-        words.push_back({assignment.id, *value});
+        words.emplace_back(assignment.id, *value);
     }
     MemoryTarget target(session, options, MemoryTarget::Use::Change);
     EepromImage edited = target.Image();
     Rows changes({{"ID", "id", Rows::Right}, {"BEFORE", "before"}, {}, {"AFTER", "after"}});
-    for (const Word& word : words) {
-        const std::uint32_t before = RawWordOf(edited, word.id);
-        SetRawWord(edited, word.id, word.value);
-        changes.Add({word.id, CellOfWord(before), "->", CellOfWord(word.value)});
+    for (const auto& [id, word] : words) {
+        const std::uint32_t before = RawWordOf(edited, id);
+        SetRawWord(edited, id, word);
+        changes.Add({id, CellOfWord(before), "->", CellOfWord(word)});
     }
     target.Change(edited, options.change, changes);
 }

@@ -8,6 +8,7 @@
 #include <ostream>
 
 #include "Memory/InputFile.h"
+#include "Output/ProgressLine.h"
 #include "Service/Memory/ImageCheck.h"
 #include "Terminal.h"
 #include "Utilities/Files/AtomicFile.h"
@@ -26,10 +27,6 @@ void RefuseToChangeInPlace(const std::string& file) {
         throw Failure(FailureKind::BadArgument, file + " is no ordinary file and cannot be changed",
                       "`--image -` reads standard input and writes what becomes of it to standard output");
     }
-}
-
-std::string CountOf(std::size_t count, const char* what) {
-    return fmt::format("{} {}{}", count, what, count == 1 ? "" : "s");
 }
 
 std::uint32_t CountDifferences(const EepromImage& a, const EepromImage& b) {
@@ -156,9 +153,9 @@ void MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& option
         return;
     }
     const bool isInstrument = outcome.pieces > 0;
-    session_.Out() << CountOf(outcome.bytes, "byte") << " of " << name_
+    session_.Out() << CountText(outcome.bytes, "byte") << " of " << name_
                    << (options.dryRun ? " would be changed" : " changed")
-                   << (isInstrument ? " in " + CountOf(outcome.pieces, "piece") : "")
+                   << (isInstrument ? " in " + CountText(outcome.pieces, "piece") : "")
                    << (isInstrument && !options.dryRun ? ", read back and compared" : "") << '\n';
 }
 

@@ -4,7 +4,6 @@
 
 #include <algorithm>
 #include <cmath>
-#include <limits>
 #include <ostream>
 #include <vector>
 
@@ -18,24 +17,8 @@ constexpr int DotColumns = 2;  // of a Braille character
 constexpr int DotRows = 4;
 
 struct Scale {
-    double low = std::numeric_limits<double>::infinity();
-    double high = -std::numeric_limits<double>::infinity();
+    double low, high;
 
-    void Take(double value) {
-        low = std::min(low, value);
-        high = std::max(high, value);
-    }
-    /// Room around values that are all the same, and an axis where there are none.
-    void Settle() {
-        if (low > high) {
-            low = 0;
-            high = 1;
-        } else if (low == high) {
-            const double room = low == 0 ? 1 : std::abs(low) / 2;
-            low -= room;
-            high += room;
-        }
-    }
     int RowOf(double value, int rows) const {
         const double part = value / (high - low) - low / (high - low);
         return std::clamp(static_cast<int>(std::lround(part * (rows - 1))), 0, rows - 1);
@@ -98,15 +81,20 @@ std::string BrailleCell(const Raster& raster, int column, int row) {
             static_cast<char>(0x80 | (pattern & 0x3F))};
 }
 
+/// Room around values that are all the same, and an axis where there are none.
 Scale ScaleOf(std::span<const double> values) {
-    Scale scale;
-    for (const double value : values) {
-        if (std::isfinite(value)) {
-            scale.Take(value);
-        }
+    std::vector<double> finite(values.begin(), values.end());
+    std::erase_if(finite, [](double value) { return !std::isfinite(value); });
+    if (finite.empty()) {
+        return {0, 1};
     }
-    scale.Settle();
-    return scale;
+    const double low = std::ranges::min(finite);
+    const double high = std::ranges::max(finite);
+    if (low < high) {
+        return {low, high};
+    }
+    const double room = low == 0 ? 1 : std::abs(low) / 2;
+    return {low - room, high + room};
 }
 
 int HeightOf(const PlotStyle& style) {

@@ -41,6 +41,10 @@ std::string SizeText(double bytes) {
     return fmt::format("{:.1f} {}", bytes, unit);
 }
 
+std::string CountText(std::uint64_t count, const std::string& noun) {
+    return std::to_string(count) + " " + noun + (count == 1 ? "" : "s");
+}
+
 ProgressLine::ProgressLine(std::ostream& terminal, StreamFacts facts, std::string what, std::uint64_t all,
                            std::string unitText)
     : stream_(terminal),

@@ -45,5 +45,7 @@ class ProgressLine final : public Service::Progress {
 
 /// "256 B", "1.3 kB", "52.4 MB"
 std::string SizeText(double bytes);
+/// "1 record", "12 records"
+std::string CountText(std::uint64_t count, const std::string& noun);
 
 }  // namespace Varnholt::Cli
