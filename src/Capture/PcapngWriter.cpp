@@ -39,14 +39,15 @@ class Bytes {
     }
     void Append(std::span<const std::uint8_t> data) { bytes.insert(bytes.end(), data.begin(), data.end()); }
     void PadToWord() { bytes.resize((bytes.size() + 3) / 4 * 4); }
+    /// The block's only option.
     void PutOption(std::uint16_t code, const std::string& text) {
         const auto length = static_cast<std::uint16_t>(std::min<std::size_t>(text.size(), 0xFFFF));
         Put(code);
         Put(length);
         bytes.insert(bytes.end(), text.begin(), text.begin() + length);
         PadToWord();
+        Put(std::uint32_t{OptionEnd});
     }
-    void EndOptions() { Put(std::uint32_t{OptionEnd}); }
 
     std::vector<std::uint8_t> bytes;
 };
@@ -110,7 +111,6 @@ PcapngWriter::PcapngWriter(const std::string& fileName, const std::string& appli
     section.Put(std::uint16_t{0});
     section.Put(~std::uint64_t{0});  // section length not given
     section.PutOption(OptionUserApplication, application);
-    section.EndOptions();
     WriteBlock(SectionHeaderBlock, section.bytes);
 
     Bytes interface;
@@ -138,7 +138,6 @@ void PcapngWriter::Write(const Packet& packet) {
     block.PadToWord();
     if (!packet.comment.empty()) {
         block.PutOption(OptionComment, packet.comment);
-        block.EndOptions();
     }
     const std::lock_guard lock(mutex_);
     WriteBlock(EnhancedPacketBlock, block.bytes);

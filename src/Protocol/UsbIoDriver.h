@@ -27,8 +27,6 @@ inline constexpr std::uint32_t AbortPipe = 0x80942084;
 /// Status codes that are named in code; `CUsbIo::ErrorText` has the texts of all.
 namespace Status {
 inline constexpr std::uint32_t Success = 0;
-inline constexpr std::uint32_t DeviceNotResponding = 0xE0000005;
-inline constexpr std::uint32_t DataOverrun = 0xE0000008;
 inline constexpr std::uint32_t TransactionError = 0xE0000011;
 inline constexpr std::uint32_t BabbleDetected = 0xE0000012;
 inline constexpr std::uint32_t EndpointHalted = 0xE0000030;
@@ -49,7 +47,6 @@ inline constexpr std::uint32_t ControlNotSupported = 0xE000100B;
 inline constexpr std::uint32_t TimedOut = 0xE000100C;
 inline constexpr std::uint32_t InvalidRecipient = 0xE000100D;
 inline constexpr std::uint32_t InvalidType = 0xE000100E;
-inline constexpr std::uint32_t InvalidIoctl = 0xE000100F;
 inline constexpr std::uint32_t InvalidDirection = 0xE0001010;
 inline constexpr std::uint32_t PipeNotFound = 0xE0001013;
 inline constexpr std::uint32_t InterfaceNotFound = 0xE0001016;
