@@ -18,7 +18,7 @@ namespace Varnholt::Cli {
 namespace {
 
 /// The system's bus, whose devices are recorded once the recording has begun.
-class BusRecording final : public TrafficRecording, private Platform::Usb::UsbBus {
+class BusRecording final : public TrafficRecording {
   public:
     explicit BusRecording(const std::string& file) : name_(file) {}
 
@@ -28,7 +28,7 @@ class BusRecording final : public TrafficRecording, private Platform::Usb::UsbBu
         }
         writer_.emplace(name_, "ostra " OSTRA_VERSION);
         Check();
-        recorded_.emplace(bus_, *writer_);
+        bus_.RecordInto(*writer_);
     }
     void Check() const override {
         if (writer_ && writer_->Failed()) {
@@ -37,17 +37,10 @@ class BusRecording final : public TrafficRecording, private Platform::Usb::UsbBu
     }
 
   private:
-    std::vector<std::string> List() override { return bus_.List(); }
-    std::shared_ptr<Platform::Usb::UsbDevice> Open(const std::string& device,
-                                                   Platform::ErrorCode& error) override {
-        return recorded_ ? recorded_->Open(device, error) : bus_.Open(device, error);
-    }
-
     const std::string name_;
-    Platform::Usb::UsbBus& bus_ = Platform::Usb::SystemUsbBus();
     std::optional<Capture::PcapngWriter> writer_;
-    std::optional<Capture::CapturingBus> recorded_;
-    const std::unique_ptr<Platform::DeviceFileSystem> files_ = Platform::Drivers::MakeDriverFileSystem(*this);
+    Capture::CapturingBus bus_{Platform::Usb::SystemUsbBus()};
+    const std::unique_ptr<Platform::DeviceFileSystem> files_ = Platform::Drivers::MakeDriverFileSystem(bus_);
     const Platform::ScopedDeviceFiles filesInForce_{*files_};
 };
 

@@ -60,15 +60,15 @@ std::shared_ptr<Usb::UsbDevice> CaptureDevice(std::shared_ptr<Usb::UsbDevice> de
 std::shared_ptr<Usb::UsbDevice> CapturingBus::Open(const std::string& name, Platform::ErrorCode& error) {
     constexpr std::uint8_t highestDeviceNumber = 127;
     std::shared_ptr<Usb::UsbDevice> device = bus_.Open(name, error);
-    if (!device) {
-        return nullptr;
+    if (!device || writer_ == nullptr) {
+        return device;
     }
     const auto known = std::ranges::find(names_, name);
     const auto number = static_cast<std::size_t>(known - names_.begin()) + 1;
     if (known == names_.end()) {
         names_.push_back(name);
     }
-    return CaptureDevice(std::move(device), writer_,
+    return CaptureDevice(std::move(device), *writer_,
                          static_cast<std::uint8_t>(std::min<std::size_t>(number, highestDeviceNumber)));
 }
 

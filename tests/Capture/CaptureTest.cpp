@@ -80,8 +80,10 @@ TEST(CaptureTest, HoldsEveryTransferAsUsbmonDoes) {
     const auto device = std::make_shared<HookedDevice>();
     bus.devices = {{"a", std::make_shared<HookedDevice>()}, {"b", device}};
     Capture::PcapngWriter writer(path, "test 1");
-    Capture::CapturingBus recorded(bus, writer);
+    Capture::CapturingBus recorded(bus);
     Platform::ErrorCode error = 0;
+    EXPECT_EQ(recorded.Open("b", error), device);
+    recorded.RecordInto(writer);
     EXPECT_EQ(recorded.List(), bus.List());
     EXPECT_NE(recorded.Open("a", error), nullptr);
     EXPECT_NE(recorded.Open("b", error), nullptr);
