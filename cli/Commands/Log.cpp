@@ -39,7 +39,7 @@ struct ResetLogOptions : MemoryOptions {
 void ResetLog(Session& session, const ResetLogOptions& options) {
     MemoryTarget target(session, options, MemoryTarget::Use::Change);
     const EepromImage empty = target.Interpret(WithEmptyLog);
-    target.Change(empty, options.change, Granularity::Elements, Json::Object(), "empty log: ");
+    target.Change(empty, options.change, Granularity::Elements, {}, "empty log: ");
 }
 
 }  // namespace

@@ -135,7 +135,7 @@ MemoryTarget::Outcome MemoryTarget::Make(const EepromImage& wanted, const Change
 }
 
 void MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& options, Granularity granularity,
-                          const Json& details, const std::string& lead) {
+                          std::initializer_list<Json::Member> details, const std::string& lead) {
     const Outcome outcome = Make(wanted, options, granularity);
     if (json_) {
         Json result = {{"target", name_},
@@ -143,7 +143,9 @@ void MemoryTarget::Change(const EepromImage& wanted, const ChangeOptions& option
                        {"changedBytes", outcome.bytes},
                        {"pieces", outcome.pieces},
                        {"backup", Json::OrNull(outcome.backup)}};
-        result.AddAll(details);
+        for (const auto& [name, value] : details) {
+            result.Add(name, value);
+        }
         session_.Print(result);
         return;
     }

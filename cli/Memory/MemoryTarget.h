@@ -59,7 +59,8 @@ class MemoryTarget final {
     /// behind `lead`. A file is replaced as a whole. Of an instrument a backup is made, only what differs is
     /// written, and all is read back.
     void Change(const Service::EepromImage& wanted, const ChangeOptions& options,
-                Service::Granularity granularity, const Json& details, const std::string& lead = {});
+                Service::Granularity granularity, std::initializer_list<Json::Member> details,
+                const std::string& lead = {});
     /// The same for a change of values, which the rows are.
     void Change(const Service::EepromImage& wanted, const ChangeOptions& options, const Rows& changes) {
         Change(wanted, options, Service::Granularity::Elements, {{"changes", changes.AsJson()}},

@@ -69,10 +69,4 @@ void Json::Append(const Json& element) {
     Insert(element.text_, EmptyArray);
 }
 
-void Json::AddAll(const Json& object) {
-    if (object.text_ != EmptyObject) {
-        Insert(object.text_.substr(1, object.text_.size() - 2), EmptyObject);
-    }
-}
-
 }  // namespace Varnholt::Cli

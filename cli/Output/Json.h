@@ -54,8 +54,6 @@ class Json final {
     void Add(const std::string& name, const Json& value);
     /// Of an array, which null becomes.
     void Append(const Json& element);
-    /// Adds the members of an object to this one.
-    void AddAll(const Json& object);
 
     /// One line.
     std::string Text() const { return text_ + '\n'; }

@@ -8,8 +8,6 @@ namespace Varnholt::Service {
 struct UsbId {
     std::string vendor;
     std::string product;
-
-    bool operator==(const UsbId&) const = default;
 };
 
 /// Reads "VID:PID"; `Failure` says what is wrong with another text.
