@@ -357,18 +357,5 @@ TEST(CommandLineTest, UsageErrorsGoToStandardError) {
     EXPECT_THAT(tool.Out(), testing::MatchesRegex("ostra [0-9.]+\n"));
 }
 
-#if !defined(_WIN32)
-TEST(CommandLineTest, AWrongOneLeavesTheCaptureFileThatIsThere) {
-    ToolRunner tool;
-    const std::string file = tool.folder.Path("capture");
-    WriteFile(file, {1});
-    for (const std::string command : {"readout --no-such-option", "scan --record-size 7",
-                                      "calibration set 1211", "readout --device nobody"}) {
-        EXPECT_NE(tool.Run("--capture @capture " + command), ExitCode::Success) << command;
-        EXPECT_EQ(ReadFile(file), std::vector<std::uint8_t>{1}) << command;
-    }
-}
-#endif
-
 }  // namespace
 }  // namespace Varnholt::Tests

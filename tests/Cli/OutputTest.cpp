@@ -1,9 +1,6 @@
 #include <gtest/gtest.h>
 #if !defined(_WIN32)
-#include <fcntl.h>
 #include <sys/resource.h>
-#include <sys/stat.h>
-#include <unistd.h>
 #endif
 
 #include <cmath>
@@ -11,7 +8,6 @@
 #include <cstdlib>
 #include <limits>
 #include <sstream>
-#include <thread>
 
 #include "Output/Json.h"
 #include "Output/LiveBlock.h"
@@ -20,7 +16,6 @@
 #include "Output/RecordingFile.h"
 #include "Output/Rows.h"
 #include "Output/WallTimeText.h"
-#include "Service/Failure.h"
 #include "Support/Bytes.h"
 #include "Support/ExpectThrow.h"
 #include "ToolFixture.h"
@@ -286,28 +281,6 @@ TEST_F(FileTest, AFullDiskLeavesTheWholeRecords) {
     }
 }
 
-/// Whatever is waited for: a reader of a FIFO at all, and one that reads.
-TEST_F(FileTest, AnInterruptionEndsEveryWait) {
-    const std::string fifo = folder_.Path("fifo");
-    ASSERT_EQ(::mkfifo(fifo.c_str(), 0600), 0);
-    const auto expectInterrupted = [](Interruption& interruption, const std::function<void()>& operation) {
-        std::thread user([&interruption] { interruption.Request(); });
-        ExpectThrow<Failure>("interrupted", operation);
-        user.join();
-    };
-    Interruption opening, writing;
-    expectInterrupted(opening, [&] { RecordingFile(fifo, opening); });
-    const int idleReader = ::open(fifo.c_str(), O_RDONLY | O_NONBLOCK);
-    ASSERT_GE(idleReader, 0);
-    RecordingFile file(fifo, writing);
-    const std::string records(1'000'000, 'x');
-    expectInterrupted(writing, [&] { file.Append(records, records.size() / 100); });
-    EXPECT_EQ(file.Records(), static_cast<std::uint64_t>(::fcntl(idleReader, F_GETPIPE_SZ)) / 100);
-    EXPECT_EQ(file.KeepWholeRecords().file, fifo);
-    ::close(idleReader);
-    EXPECT_TRUE(std::filesystem::is_fifo(fifo));
-}
-
 TEST_F(FileTest, ALinkStaysAndADeviceIsWrittenTo) {
     WriteFile(path_, {1});
     std::filesystem::create_symlink(path_, folder_.Path("link"));
@@ -319,6 +292,9 @@ TEST_F(FileTest, ALinkStaysAndADeviceIsWrittenTo) {
                                [size] { WriteFileAtomically("/dev/full", Bytes(size)); });
     }
     EXPECT_TRUE(std::filesystem::is_character_file("/dev/full"));
+    RecordingFile device("/dev/null", none_);
+    device.Append(std::string("1"), 1);
+    EXPECT_EQ(device.KeepWholeRecords().file, "/dev/null");
 }
 
 /// In zones that a POSIX text describes, so that no data base is needed.
