@@ -114,7 +114,7 @@ TEST_P(OnKernel, WritesAnImageAndReadsItBackAndLeavesNothingBehind) {
     std::array<std::int32_t, OSTRA_READOUT_VALUES> values{};
     const auto before = TestSupport::ResourceCount::TakeSettled();
     ASSERT_EQ(d4fb86cecc88582a(values.data(), ""), OSTRA_OK) << LastError();
-    EXPECT_TRUE(before.Settles()) << TestSupport::ResourceCount::Take() << " were " << before;
+    EXPECT_TRUE(before.Settles()) << TestSupport::ResourceCount() << " were " << before;
     EXPECT_NE(*std::ranges::max_element(values), *std::ranges::min_element(values));
     PellandoFunctionality instrument(nullptr, 0);
     std::vector<std::uint8_t> half(4096);

@@ -4,6 +4,7 @@
 #include "Protocol/ByteOrder.h"
 #include "Protocol/UsbIoDriver.h"
 #include "Service/Finding.h"
+#include "Support/FailCalls.h"
 #include "Support/ScriptedDriver.h"
 #include "Support/TestClock.h"
 
@@ -65,11 +66,12 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
         if (row.isSilent) {
             driver.Script(0, {.after = Never});
         }
-        driver.enumerationFailure = row.enumeration;
+        FailCalls("LoadEnumeration", row.enumeration);
         Service::Observer nobody;
         Service::Interruption never;
         Service::Context context(nobody, never, files);
         ExpectFindings(Service::DiagnoseDrivers(context), row.levels, row.text, row.fix, row.failure);
+        Platform::InstallCallFilter({});
         Platform::Override64BitHost(std::nullopt);
     }
 }

@@ -168,7 +168,7 @@ TEST_F(UsbIpServerTest, InstrumentsAreListedByNameForAsLongAsTheyAreThere) {
         }
         EXPECT_FALSE(SimulatorBus().Has(name_)) << "the prefix is a part of the name";
     }
-    EXPECT_TRUE(before.Settles()) << before << " before, " << TestSupport::ResourceCount::Take() << " after";
+    EXPECT_TRUE(before.Settles()) << before << " before, " << TestSupport::ResourceCount() << " after";
 }
 
 /// A megabyte does not go into a socket at once.

@@ -70,22 +70,18 @@ void ScriptedDriver::OnOpen(const std::string& path, std::function<ErrorCode()> 
     openActions_[path] = std::move(action);
 }
 
-bool ScriptedDriver::Complete(std::uint32_t place, const std::optional<Answer>& answer) {
+bool ScriptedDriver::Complete(std::uint32_t place, const Answer& answer) {
     std::uint64_t number = 0;
-    ErrorCode code = Errors::Success;
     {
         const std::lock_guard held(lock_);
         const auto oldest = std::ranges::find(running_, place, &Transfer::place);
         if (oldest == running_.end()) {
             return false;
         }
-        if (answer) {
-            oldest->answer = *answer;
-        }
+        oldest->answer = answer;
         number = oldest->number;
-        code = oldest->answer.code;
     }
-    End(number, code, true);
+    End(number, answer.code, true);
     return true;
 }
 
@@ -116,11 +112,6 @@ std::size_t ScriptedDriver::Running(std::optional<std::uint32_t> place) const {
 std::uint64_t ScriptedDriver::BytesIn(std::uint32_t place) {
     const std::lock_guard held(lock_);
     return bytesIn_[place];
-}
-
-bool ScriptedDriver::LoadEnumeration() {
-    SetLastError(enumerationFailure);
-    return enumerationFailure == Errors::Success;
 }
 
 std::vector<std::string> ScriptedDriver::ListInterfaces(const Protocol::Guid& interfaceClass) {
@@ -340,11 +331,11 @@ bool ScriptedDriver::CancelTransfers(Handle handle) {
     for (const Transfer& transfer : cancelled) {
         const Answer& answer = transfer.answer;
         if (answer.cancelledAfter == 0) {
-            End(transfer.number, answer.cancelledWith, answer.cancelledWithData);
+            End(transfer.number, Errors::OperationAborted, answer.cancelledWithData);
         } else if (answer.cancelledAfter != Never) {
             // Between two looks of a waiting `GetResult`.
-            EndLater(transfer.number, std::uint64_t{answer.cancelledAfter} * 1000 - 500, answer.cancelledWith,
-                     answer.cancelledWithData);
+            EndLater(transfer.number, std::uint64_t{answer.cancelledAfter} * 1000 - 500,
+                     Errors::OperationAborted, answer.cancelledWithData);
         }
     }
     return true;

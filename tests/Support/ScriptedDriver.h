@@ -30,10 +30,9 @@ struct Answer {
     Platform::ErrorCode refusal = Platform::Errors::Success;  ///< the start fails
     Platform::Handle completesThrough = Platform::NoHandle;   ///< put in the place of the record's event
 
-    /// A cancelled transfer ends so late, with this code; `Never`: only the close of the file ends it. It
-    /// brings `data` nevertheless when told so.
+    /// A cancelled transfer ends so late; `Never`: only the close of the file ends it. It brings `data`
+    /// nevertheless when told so.
     std::uint32_t cancelledAfter = 0;
-    Platform::ErrorCode cancelledWith = Platform::Errors::OperationAborted;
     bool cancelledWithData = false;
 
     std::function<void()> onStart{};  ///< called by the starter, before anything else
@@ -62,9 +61,8 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     void RefuseOpen(const std::string& path, Platform::ErrorCode code) {
         OnOpen(path, [code] { return code; });
     }
-    /// Completes the oldest running transfer of the pipe or endpoint, as it was scripted or with another
-    /// answer; false if none runs.
-    bool Complete(std::uint32_t place, const std::optional<Answer>& answer = {});
+    /// Completes the oldest running transfer of the pipe or endpoint; false if none runs.
+    bool Complete(std::uint32_t place, const Answer& answer);
 
     /// What happened since the last call; the transfers are all but opens and closes of files.
     std::vector<std::string> TakeTranscript();
@@ -74,10 +72,7 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     /// What all reads of the place brought in together.
     std::uint64_t BytesIn(std::uint32_t place);
 
-    /// What keeps the enumeration from being loaded.
-    Platform::ErrorCode enumerationFailure = Platform::Errors::Success;
-
-    bool LoadEnumeration() override;
+    bool LoadEnumeration() override { return true; }
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
     Platform::Handle Open(const std::string& path) override;
     bool CloseFile(Platform::Handle file) override;

@@ -171,7 +171,7 @@ TEST_P(AllocationFailure, EndsInAResultCodeAndLeavesNothing) {
         ASSERT_TRUE(code == OSTRA_OK || code == OSTRA_FAILURE || code == OSTRA_UNKNOWN_FAILURE) << code;
         ASSERT_FALSE(instrument.Claimed());
         ASSERT_EQ(instrument.PendingTransfers(), 0U);
-        ASSERT_TRUE(before.Settles()) << "before: " << before << "\nafter: " << ResourceCount::Take();
+        ASSERT_TRUE(before.Settles()) << "before: " << before << "\nafter: " << ResourceCount();
         if (!reached) {
             EXPECT_EQ(code == OSTRA_OK, tested.succeeds);
         }

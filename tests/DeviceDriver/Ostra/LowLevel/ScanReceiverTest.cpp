@@ -9,7 +9,6 @@ namespace Varnholt::Tests {
 namespace {
 
 using namespace DeviceDriver::Ostra::LowLevel;
-using Bytes = std::vector<std::uint8_t>;
 
 struct CollectingReceiver final : ScanReceiver {
     void Receive(std::span<const std::uint8_t> data) override {
