@@ -3,38 +3,16 @@
 #include <unistd.h>
 
 #include <array>
-#include <atomic>
 #include <cstdint>
 #include <cstdlib>
 
 #include "Platform/Usb/UsbDescriptors.h"
 #include "Platform/Usb/UsbIpDevice.h"
-#include "Protocol/Instrument.h"
-
-namespace {
+#include "Support/TestTransfer.h"
 
 using namespace Varnholt::Platform;
 using namespace Varnholt::Platform::Usb;
-
-class CountedTransfer final : public Transfer, private TransferClient {
-  public:
-    explicit CountedTransfer(std::uint8_t usbEndpoint) {
-        endpoint = usbEndpoint;
-        setup = {0xC0, 0xC9, 0, 0, static_cast<std::uint16_t>(buffer_.size())};
-        data = buffer_.data();
-        length = static_cast<std::uint32_t>(buffer_.size());
-        client = this;
-    }
-    int Completions() const { return completions_; }
-
-  private:
-    void TransferCompleted(Transfer&) noexcept override { ++completions_; }
-
-    std::array<std::uint8_t, 64> buffer_{};
-    std::atomic<int> completions_ = 0;
-};
-
-}  // namespace
+using Varnholt::Tests::TestTransfer;
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* input, std::size_t size) {
     constexpr std::size_t shortestEndpoint = 6;
@@ -58,8 +36,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* input, std::size_t siz
     if (size % 4 == 0) {
         ListUsbIpDevices(connect);
     } else {
-        std::array transfers{CountedTransfer(0), CountedTransfer(Varnholt::Protocol::BulkInEndpoint),
-                             CountedTransfer(Varnholt::Protocol::BulkOutEndpoint)};
+        std::array transfers{
+            TestTransfer::VendorQuestion(Varnholt::Protocol::Request::GetMisc, 64),
+            TestTransfer::In(Varnholt::Protocol::BulkInEndpoint, 64),
+            TestTransfer::Out(Varnholt::Protocol::BulkOutEndpoint, std::vector<std::uint8_t>(64))};
         std::array<bool, transfers.size()> accepted{};
         {
             const auto device = MakeUsbIpDevice(connect, "1-1");
@@ -71,7 +51,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* input, std::size_t siz
             }
         }
         for (std::size_t i = 0; i < transfers.size(); ++i) {
-            if (transfers[i].Completions() != (accepted[i] ? 1 : 0)) {
+            if (transfers[i].completions != (accepted[i] ? 1 : 0)) {
                 std::abort();
             }
         }

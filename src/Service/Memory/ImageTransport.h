@@ -8,7 +8,7 @@ namespace Varnholt::Service {
 /// An EEPROM image in the place of an instrument: what reads and writes the EEPROM works on it unchanged.
 /// Every other command but the reset, which does nothing, is refused with `IOException`, and so is an access
 /// that is not wholly inside the image.
-class ImageTransport final : public DeviceDriver::Ostra::LowLevel::PellandoFunctionalityByte {
+class ImageTransport : public DeviceDriver::Ostra::LowLevel::PellandoFunctionalityByte {
   public:
     using Bytes2 = DeviceDriver::Ostra::LowLevel::Bytes2;
     using Bytes4 = DeviceDriver::Ostra::LowLevel::Bytes4;

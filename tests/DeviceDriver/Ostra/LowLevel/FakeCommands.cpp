@@ -1,10 +1,10 @@
 #include "FakeCommands.h"
 
-#include <algorithm>
 #include <utility>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Protocol/ByteOrder.h"
+#include "Service/Memory/ImageTransport.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
@@ -26,9 +26,9 @@ std::uint16_t Number(const Bytes2& bytes) {
     return Protocol::LoadBig16(bytes.data());
 }
 
-class FakeCommands final : public PellandoFunctionalityByte {
+class FakeCommands final : public Service::ImageTransport {
   public:
-    explicit FakeCommands(FakeInstrument& fake) : instrument_(fake) {}
+    explicit FakeCommands(FakeInstrument& fake) : ImageTransport(fake.eeprom), instrument_(fake) {}
 
     void SetMeasureParameters(const Bytes2& p1, const Bytes2& p2, const Bytes2& p3,
                               std::uint8_t p4) override {
@@ -62,11 +62,13 @@ class FakeCommands final : public PellandoFunctionalityByte {
     }
     void WriteEEPROM(const Bytes4& address, const Bytes2& length, const std::uint8_t* data,
                      std::uint32_t count) override {
-        std::copy_n(data, count, Place("write ", address, length, count));
+        Receive("write ", address, length);
+        ImageTransport::WriteEEPROM(address, length, data, count);
     }
     void ReadEEPROM(const Bytes4& address, const Bytes2& length, std::uint8_t* data,
                     std::uint32_t count) override {
-        std::copy_n(Place("read ", address, length, count), count, data);
+        Receive("read ", address, length);
+        ImageTransport::ReadEEPROM(address, length, data, count);
     }
     void GetMISC(std::uint8_t& m1, Bytes2& m2, std::uint8_t& m3, Bytes2& m4, Bytes2& m5) override {
         Receive("GetMISC");
@@ -78,18 +80,6 @@ class FakeCommands final : public PellandoFunctionalityByte {
     }
     void Reset(const Bytes2&) override { Receive("Reset"); }
 
-    // What nobody asks it for.
-    void WriteCPLD(const Bytes2&, const Bytes2&, const Bytes2&) override {}
-    void ReadCPLD(Bytes2&) override {}
-    void DownloadRAMFirmware(std::uint16_t, const std::uint8_t*, std::uint32_t) override {}
-    void DownloadEEPROMFirmware(const Bytes4&, const Bytes2&, const std::uint8_t*, std::uint32_t) override {}
-    void GetScanData(std::uint8_t*, std::uint32_t*) override {}
-    void RemoveListener(Generic::EventListener*) override {}
-    void StartScan(std::uint32_t, std::uint32_t, std::uint32_t) override {}
-    void MeasureRequest(std::uint8_t*, std::uint32_t, std::uint32_t) override {}
-    void GetChipID(std::uint8_t*) override {}
-    void GetDeviceIdentifier(std::string&) override {}
-
   private:
     void Receive(const std::string& command) {
         instrument_.commands.push_back(command);
@@ -97,14 +87,9 @@ class FakeCommands final : public PellandoFunctionalityByte {
             throw IOException("the fake fails", Here());
         }
     }
-    std::uint8_t* Place(const char* name, const Bytes4& address, const Bytes2& length, std::uint32_t count) {
-        const std::uint32_t start = Protocol::LoadBig32(address.data());
-        if (start > instrument_.eeprom.size() || count > instrument_.eeprom.size() - start ||
-            count != Number(length)) {
-            throw std::logic_error("EEPROM transfer outside the EEPROM");
-        }
-        Receive(name + std::to_string(start) + "+" + std::to_string(count));
-        return instrument_.eeprom.data() + start;
+    void Receive(const std::string& name, const Bytes4& address, const Bytes2& length) {
+        Receive(name + std::to_string(Protocol::LoadBig32(address.data())) + "+" +
+                std::to_string(Number(length)));
     }
 
     FakeInstrument& instrument_;

@@ -6,10 +6,8 @@
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
-#include "FakeCommands.h"
-#include "FreshEeprom.h"
-#include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
+#include "Service/Memory/ImageModel.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
@@ -20,6 +18,8 @@ using Generic::Utilities::DataException;
 using Varnholt::Utilities::Exceptions::ResourceException;
 
 namespace {
+
+using Bytes = std::vector<std::uint8_t>;
 
 bool IsDocumented(const std::exception& exception) {
     const std::string text = exception.what();
@@ -60,9 +60,7 @@ Values ValuesOf(PellandoEEPROM& eeprom) {
 }
 
 Values ValuesIn(const Bytes& image) {
-    FakeInstrument instrument{.eeprom = image};
-    PellandoEEPROM eeprom(Open(instrument));
-    return ValuesOf(eeprom);
+    return ValuesOf(Service::ImageModel(image).Get());
 }
 
 /// Whether the image's table finds the model's values of a section from `start` on.
@@ -79,64 +77,37 @@ Property Resized(Property value, std::uint16_t elements) {
 
 }  // namespace
 
-ImageOutcome CheckImage(const Bytes& image, const std::vector<Resize>& resizes) {
-    FakeInstrument instrument{.eeprom = image};
-    const auto functionality = Open(instrument);
-    std::optional<PellandoEEPROM> eeprom;
-    if (!Succeeds("load", [&] { eeprom.emplace(functionality); })) {
-        return ImageOutcome::Refused;
+bool RoundTrips(const Bytes& image, const std::vector<Resize>& resizes) {
+    std::optional<Service::ImageModel> model;
+    if (!Succeeds("load", [&] { model.emplace(image); })) {
+        return false;
     }
+    PellandoEEPROM& eeprom = model->Get();
     Bytes dumped;
     if (!Succeeds("dump", [&] {
             for (const Resize& resize : resizes) {
-                eeprom->SetProperty(resize.id, Resized(eeprom->GetProperty(resize.id), resize.elements));
+                eeprom.SetProperty(resize.id, Resized(eeprom.GetProperty(resize.id), resize.elements));
             }
-            dumped = eeprom->Dump();
+            dumped = eeprom.Dump();
         })) {
-        return ImageOutcome::DumpRefused;
+        return false;
     }
-    if (!Locates(dumped, *eeprom, "LogData", EepromMap::MainLog) ||
-        !Locates(dumped, *eeprom, "CalibrationData", EepromMap::Calibration)) {
-        return ImageOutcome::Misplaced;
+    if (!Locates(dumped, eeprom, "LogData", EepromMap::MainLog) ||
+        !Locates(dumped, eeprom, "CalibrationData", EepromMap::Calibration)) {
+        return false;
     }
-    const Values expected = ValuesOf(*eeprom);  // behind the dump, which renews the checksum
+    const Values expected = ValuesOf(eeprom);  // behind the dump, which renews the checksum
     if (ValuesIn(dumped) != expected) {
         throw std::logic_error("the dump reads differently");
     }
-    if (Locates(dumped, *eeprom, "LogData", EepromMap::LogCopy, EepromMap::LogCopyIdOffset)) {
-        dumped[EepromMap::MainLog] = static_cast<std::uint8_t>(~dumped[EepromMap::MainLog]);
-        if (ValuesIn(dumped) != expected) {
-            throw std::logic_error("the dump's second log reads differently");
-        }
+    if (!Locates(dumped, eeprom, "LogData", EepromMap::LogCopy, EepromMap::LogCopyIdOffset)) {
+        return false;
     }
-    return ImageOutcome::RoundTripRight;
-}
-
-ImageOutcome CheckRecords(const std::uint8_t* records, std::size_t size) {
-    static const Bytes fresh = Simulator::FreshEeprom();
-    static const std::vector<std::uint16_t> ids = [] {
-        std::vector<std::uint16_t> all;
-        for (const Properties* set :
-             {&PellandoEAT::GetDefaultLogData(), &PellandoEAT::GetDefaultCalibrationData()}) {
-            for (const auto& entry : set->GetDatastore()) {
-                all.push_back(entry.first);
-            }
-        }
-        return all;
-    }();
-    constexpr std::size_t recordSize = 4;
-    Bytes image = fresh;
-    std::vector<Resize> resizes;
-    for (; size >= recordSize; size -= recordSize, records += recordSize) {
-        const std::uint16_t place = Protocol::LoadBig16(records);
-        const std::uint16_t number = Protocol::LoadBig16(records + 2);
-        if (place + sizeof(number) <= image.size()) {
-            Protocol::StoreBig16(&image[place], number);
-        } else {
-            resizes.push_back({ids[place % ids.size()], static_cast<std::uint16_t>(number % 2048)});
-        }
+    dumped[EepromMap::MainLog] = static_cast<std::uint8_t>(~dumped[EepromMap::MainLog]);
+    if (ValuesIn(dumped) != expected) {
+        throw std::logic_error("the dump's second log reads differently");
     }
-    return CheckImage(image, resizes);
+    return true;
 }
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel
