@@ -42,8 +42,9 @@ TEST(SimulatedLibrary, ServesAHostFromTheSetupInTheEnvironment) {
     const Tests::TestFolder folder;
     const std::string memory = folder.Path("memory.bin");
     const std::string setup = folder.Path("setup");
-    std::ofstream(setup) << Time << "# three instruments\nname=lamp light=2 eeprom=" << memory
-                         << "\nname=dark light=0\nname=mute faults=\"bulk-in 0+:stall; bulk-out 3+:stall\"\n";
+    std::ofstream(setup)
+        << Time << "# three instruments\nname=lamp light=30 gain=0.1 eeprom=" << memory
+        << "\nname=dim light=2 gain=0.05\nname=mute faults=\"bulk-in 0+:stall; bulk-out 3+:stall\"\n";
     SetVariable("OSTRA_SIMULATED", "@" + folder.Path("none"));
     Values lamp{};
     EXPECT_EQ("OSTRA_SIMULATED: " + folder.Path("none") + " cannot be read", ReadoutOf("", lamp));
@@ -53,10 +54,11 @@ TEST(SimulatedLibrary, ServesAHostFromTheSetupInTheEnvironment) {
     Values again{};
     ASSERT_EQ("", ReadoutOf(Way + "lamp", again));
     EXPECT_NE(lamp, again) << "the noise goes on";
-    Values dark{};
-    ASSERT_EQ("", ReadoutOf(Way + "dark", dark));
-    EXPECT_LT(*std::ranges::max_element(dark), *std::ranges::max_element(lamp) / 10);
-    EXPECT_NE("", ReadoutOf(Way + "mute", dark)) << "the driver's text of what went wrong";
+    EXPECT_EQ(60000, *std::ranges::max_element(lamp)) << "saturated";
+    Values dim{};
+    ASSERT_EQ("", ReadoutOf(Way + "dim", dim));
+    EXPECT_LT(*std::ranges::max_element(dim), 6000);
+    EXPECT_NE("", ReadoutOf(Way + "mute", dim)) << "the driver's text of what went wrong";
     Values none{};
     EXPECT_EQ("", ReadoutOf(Way + "other", none)) << "no text: there is none";
     EXPECT_EQ(Values{}, none);
