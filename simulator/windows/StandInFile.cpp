@@ -9,7 +9,6 @@
 
 #include "KernelStatus.h"
 #include "Platform/EventScheduler.h"
-#include "Protocol/ByteOrder.h"
 #include "TestControls.h"
 
 namespace Varnholt::Simulator {
@@ -69,10 +68,6 @@ Status StandInFileObject::Control(std::uint32_t code, std::span<const std::uint8
     const std::vector<std::uint8_t> copiedInput(input.begin(), input.end());
     const auto running = std::make_shared<Running>(shared_from_this(), request);
     const Decision decision = driver_->Control(code, copiedInput, output, running->transfer);
-    if (code == Protocol::UsbIoDriver::Control::GetDriverInfo && decision.kind == Decision::Kind::Done &&
-        output.size() >= 2) {
-        Protocol::StoreLittle16(output.data(), instrument_->interfaceVersion);
-    }
     return Start(decision, running, bytes);
 }
 
@@ -171,12 +166,6 @@ std::optional<Status> StandInFileObject::TestControl(std::uint32_t code, std::sp
             } catch (const std::invalid_argument&) {
                 return KernelStatus(Platform::Errors::InvalidParameter);
             }
-            break;
-        case TestControls::SetInterfaceVersion:
-            if (input.size() != 2) {
-                return KernelStatus(Platform::Errors::InvalidParameter);
-            }
-            instrument_->interfaceVersion = Protocol::LoadLittle16(input.data());
             break;
         case TestControls::UseElsewhere:
             instrument_->UseElsewhere();

@@ -10,7 +10,6 @@
 #include "Platform/Drivers/DriverFile.h"
 #include "Platform/Drivers/SharedDevice.h"
 #include "Platform/Drivers/UsbIoDevice.h"
-#include "Protocol/UsbIoDriver.h"
 #include "SimulatedInstrument.h"
 
 namespace Varnholt::Simulator {
@@ -42,8 +41,6 @@ class StandInInstrumentObject final : public Platform::Drivers::EndpointCancelle
     /// For good, from the next opening of a device that is not open.
     void UseElsewhere() { usedElsewhere_ = true; }
     bool IsUsedElsewhere() const { return usedElsewhere_; }
-
-    std::atomic<std::uint16_t> interfaceVersion = Protocol::UsbIoDriver::InterfaceVersion;
 
   private:
     std::vector<std::shared_ptr<StandInFileObject>> Files();

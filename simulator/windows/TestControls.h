@@ -15,8 +15,6 @@ constexpr std::uint32_t Code(std::uint32_t function) {
 inline constexpr std::uint32_t PressButton = Code(0x900);
 /// Input: a fault plan as text. It holds for the openings of the instrument that come after it.
 inline constexpr std::uint32_t SetFaults = Code(0x901);
-/// Input: 2 bytes, what the driver information gives as the interface version, least significant byte first.
-inline constexpr std::uint32_t SetInterfaceVersion = Code(0x902);
 /// Once all handles are closed somebody else has the USB device, and openings that need it are refused.
 inline constexpr std::uint32_t UseElsewhere = Code(0x903);
 /// Output: the content of the EEPROM.

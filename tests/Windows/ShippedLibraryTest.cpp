@@ -324,11 +324,6 @@ TEST_F(Shipped, DoctorNamesTheReason) {
                       : "on 32-bit Windows the instrument's own driver is used; devices present: 1");
     expect(3, "which is not used here: --transport asks for",
            is64Bit ? " --transport native" : " --transport usbio");
-    if (is64Bit) {
-        Instrument(path).SetInterfaceVersion(0x0300);
-        expect(3, "has a USBIO driver of interface version 3.00");
-        Instrument(path).SetInterfaceVersion(0x0230);
-    }
     const std::string copy = "C:\\doctor\\doctor.exe";
     CreateDirectoryA("C:\\doctor", nullptr);
     ASSERT_TRUE(CopyFileA(tool.c_str(), copy.c_str(), FALSE));

@@ -149,10 +149,6 @@ void Instrument::SetFaults(const std::string& plan) {
     Control(Simulator::TestControls::SetFaults, plan.data(), plan.size());
 }
 
-void Instrument::SetInterfaceVersion(WORD version) {
-    Control(Simulator::TestControls::SetInterfaceVersion, &version, sizeof version);
-}
-
 std::vector<BYTE> Instrument::Eeprom() {
     std::vector<BYTE> content(8192);
     content.resize(Control(Simulator::TestControls::ReadEeprom, nullptr, 0, content.data(), content.size()));

@@ -58,7 +58,6 @@ class Instrument final {
 
     void PressButton() { Control(Simulator::TestControls::PressButton); }
     void SetFaults(const std::string& plan);
-    void SetInterfaceVersion(WORD version);
     void UseElsewhere() { Control(Simulator::TestControls::UseElsewhere); }
     std::vector<BYTE> Eeprom();
     std::string TakeTranscript();
