@@ -115,7 +115,8 @@ def test_what_an_instrument_says_of_itself(ostra_simulated, transport):
     with ostra.open(f"chip:{listed.chip_id}", transport) as instrument:
         identity = instrument.identify()
         assert identity.chip_id == instrument.chip_id() == listed.chip_id
-        assert identity.misc[1] == 301 and instrument.mode == 1
+        assert list(identity.misc) == [0x21, 301, 0x43, 0x0506, 0x0708] and instrument.mode == 1
+        assert list(identity.mode) == [3, 1, 0, 130, 68, 1]
         instrument.mode = 2
         assert instrument.mode == 2
         assert instrument.ram.set({2009: 0.02})[2009] == pytest.approx(0.02, abs=68e-6)
