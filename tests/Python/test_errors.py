@@ -18,10 +18,8 @@ import ostra
     ("faults", "kind"),
     [
         ("bulk-in 0:stall", ostra.TransferFailed),
-        ("bulk-in 0:io-error", ostra.TransferFailed),
         ("bulk-in 0:silent", ostra.Timeout),
         ("bulk-in 0:short=10", ostra.ShortData),
-        ("bulk-in 0:empty", ostra.ShortData),
         ("bulk-in 0:gone-during", ostra.Unplugged),
         ("control 1:gone-before", ostra.Unplugged),
     ],
