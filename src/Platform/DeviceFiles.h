@@ -1,7 +1,10 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
+#include <span>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "Platform/DeviceInterfaces.h"
@@ -20,6 +23,34 @@ struct Overlapped {
     std::uint32_t offset = 0;
     std::uint32_t offsetHigh = 0;
     Handle event = NoHandle;
+};
+
+/// What a transfer is to do. The buffers are the caller's.
+struct Operation {
+    enum class Kind { Read, Write, Control };
+
+    static Operation Read(void* buffer, std::uint32_t size) {
+        return {Kind::Read, static_cast<std::uint8_t*>(buffer), size, 0, {}};
+    }
+    static Operation Write(const void* buffer, std::uint32_t size) {
+        return {Kind::Write, static_cast<std::uint8_t*>(const_cast<void*>(buffer)), size, 0, {}};
+    }
+    static Operation Control(std::uint32_t controlCode, std::span<const std::uint8_t> block, void* output,
+                             std::uint32_t outputSize) {
+        return {Kind::Control, static_cast<std::uint8_t*>(output), outputSize, controlCode, block};
+    }
+
+    /// For a call filter.
+    std::string_view CallName() const {
+        static constexpr std::string_view names[] = {"StartRead", "StartWrite", "StartControl"};
+        return names[static_cast<std::size_t>(kind)];
+    }
+
+    Kind kind;
+    std::uint8_t* data;    ///< what is read into, written from (and only read then), or a control's output
+    std::uint32_t length;  ///< of the data
+    std::uint32_t code;    ///< of a control
+    std::span<const std::uint8_t> input;  ///< of a control
 };
 
 /// The files that drivers present: devices and the pipes below them, opened by path, moved by overlapped
@@ -50,13 +81,10 @@ class DeviceFileSystem {
     /// Transfers still running on the handle are ended and completed before the file is gone.
     virtual bool CloseFile(Handle file) = 0;
 
-    /// Start a transfer: true when it completed at once, false with `Errors::IoPending` when it runs, false
+    /// Starts a transfer: true when it completed at once, false with `Errors::IoPending` when it runs, false
     /// with another code when it could not be started. The record's event is reset at the start and signalled
     /// at completion, also when the transfer completes at once.
-    virtual bool StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) = 0;
-    virtual bool StartWrite(Handle file, const void* buffer, std::uint32_t length, Overlapped& record) = 0;
-    virtual bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
-                              void* output, std::uint32_t outputSize, Overlapped& record) = 0;
+    virtual bool Start(Handle file, const Operation& operation, Overlapped& record) = 0;
 
     /// The outcome of the record's transfer: true and the bytes moved, or false with the transfer's code.
     /// `Errors::IoIncomplete` while it runs, unless `wait` is set: then it is waited for, as long as its

@@ -10,26 +10,10 @@ OverlappedRequest::~OverlappedRequest() {
     CancelAndWait();
 }
 
-bool OverlappedRequest::StartRead(Handle readFrom, void* buffer, std::uint32_t length) {
+bool OverlappedRequest::Start(Handle startedOn, const Operation& operation) {
     CancelAndWait();
-    return Started(readFrom, DeviceFiles().StartRead(readFrom, buffer, length, record_));
-}
-
-bool OverlappedRequest::StartWrite(Handle writeTo, const void* buffer, std::uint32_t length) {
-    CancelAndWait();
-    return Started(writeTo, DeviceFiles().StartWrite(writeTo, buffer, length, record_));
-}
-
-bool OverlappedRequest::StartControl(Handle device, std::uint32_t code, const void* input,
-                                     std::uint32_t inputSize, void* output, std::uint32_t outputSize) {
-    CancelAndWait();
-    return Started(device,
-                   DeviceFiles().StartControl(device, code, input, inputSize, output, outputSize, record_));
-}
-
-bool OverlappedRequest::Started(Handle startedOn, bool completedAtOnce) {
     file_ = startedOn;
-    if (completedAtOnce) {
+    if (DeviceFiles().Start(file_, operation, record_)) {
         state_ = State::Running;  // its result is still to be fetched
         return true;
     }

@@ -19,11 +19,8 @@ class OverlappedRequest final {
     OverlappedRequest(const OverlappedRequest&) = delete;
     OverlappedRequest& operator=(const OverlappedRequest&) = delete;
 
-    /// As the operations of `DeviceFileSystem`. The buffer must outlive the request or its completion.
-    bool StartRead(Handle file, void* buffer, std::uint32_t length);
-    bool StartWrite(Handle file, const void* buffer, std::uint32_t length);
-    bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
-                      void* output, std::uint32_t outputSize);
+    /// As that of `DeviceFileSystem`. The buffer must outlive the request or its completion.
+    bool Start(Handle file, const Operation& operation);
 
     /// Result of the last start; after a start that failed: that failure again. `wait` waits for the
     /// completion, as long as the file's driver lets it last.
@@ -38,8 +35,6 @@ class OverlappedRequest final {
 
   private:
     enum class State { Idle, Running, Completed, FailedToStart };
-
-    bool Started(Handle startedOn, bool completedAtOnce);
 
     Overlapped record_;
     Handle file_ = NoHandle;

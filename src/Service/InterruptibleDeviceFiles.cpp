@@ -104,7 +104,7 @@ bool InterruptibleDeviceFiles::IsInterrupted(Handle file) {
 
 void InterruptibleDeviceFiles::AbortPipe(const OpenedFile& file) {
     if (file.pipe == Native::ControlPipe) {
-        Control(file.handle, Protocol::UsbIoDriver::Control::AbortPipe, nullptr, 0);
+        Control(file.handle, Protocol::UsbIoDriver::Control::AbortPipe, {});
         return;
     }
     const auto owner = std::ranges::find_if(files_, [&file](const OpenedFile& other) {
@@ -117,19 +117,18 @@ void InterruptibleDeviceFiles::AbortPipe(const OpenedFile& file) {
     Protocol::StoreLittle16(&block[Native::Block::Value], file.pipe == Native::ReadPipe
                                                               ? Protocol::BulkInEndpoint
                                                               : Protocol::BulkOutEndpoint);
-    Control(owner->handle, Native::ControlAbortPipe, block.data(), static_cast<std::uint32_t>(block.size()));
+    Control(owner->handle, Native::ControlAbortPipe, block);
 }
 
 /// Failures do not matter: whoever waits for the transfers still has limits of his own.
-void InterruptibleDeviceFiles::Control(Handle file, std::uint32_t code, const void* input,
-                                       std::uint32_t inputSize) {
+void InterruptibleDeviceFiles::Control(Handle file, std::uint32_t code, std::span<const std::uint8_t> block) {
     const OwnedHandle event(MakeAutoResetEvent());
     if (!event) {
         return;
     }
     Overlapped record;
     record.event = event.Get();
-    if (below_.StartControl(file, code, input, inputSize, nullptr, 0, record) ||
+    if (below_.Start(file, Operation::Control(code, block, nullptr, 0), record) ||
         LastError() != Errors::IoPending) {
         return;
     }
@@ -199,78 +198,58 @@ void InterruptibleDeviceFiles::Ended(const Overlapped& record, std::uint32_t tra
     SetLastError(code);
 }
 
-/// Of a transfer that is noted already: its end may be learnt of on another thread.
-template <class Start>
-bool InterruptibleDeviceFiles::Started(const Overlapped& record, Start start) {
-    const bool completed = start();
+/// How the operation's end is told; empty where it is told nobody.
+InterruptibleDeviceFiles::Description InterruptibleDeviceFiles::DescriptionOf(
+    const OpenedFile* opened, const Operation& operation) const {
+    if (!log_) {
+        return {};
+    }
+    const std::uint32_t length = operation.length;
+    if (operation.kind == Operation::Kind::Control) {
+        const auto request = VendorRequestOf(operation.code, operation.input);
+        if (!request) {
+            return {};
+        }
+        return [request = *request, data = operation.data, length](std::uint32_t transferred) {
+            const std::uint32_t known = request.isIn ? std::min(transferred, length) : length;
+            return Capture::DescribeRequest(request.request, request.value, {data, known});
+        };
+    }
+    std::uint8_t endpoint =
+        operation.kind == Operation::Kind::Read ? Protocol::BulkInEndpoint : Protocol::BulkOutEndpoint;
+    if (opened != nullptr && opened->waitsForButton) {
+        endpoint = Protocol::InterruptInEndpoint;
+    }
+    return [endpoint, length](std::uint32_t transferred) {
+        return Capture::DescribeData(endpoint, transferred, length);
+    };
+}
+
+/// The section is held over the start of a read or write, so that none slips in behind an interruption. A
+/// control is short and has no pipe that could be aborted; it ends by itself. Each is noted before its start:
+/// its end may be learnt of on another thread.
+bool InterruptibleDeviceFiles::Start(Handle file, const Operation& operation, Overlapped& record) try {
+    std::unique_lock holder(section_);
+    if (IsInterrupted(file)) {
+        return Refuse(record, Errors::OperationAborted);
+    }
+    const bool isControl = operation.kind == Operation::Kind::Control;
+    OpenedFile* const opened = Find(file);
+    running_[&record] = {file, !isControl, DescriptionOf(opened, operation)};
+    if (isControl) {
+        if (opened != nullptr && operation.code == Protocol::UsbIoDriver::Control::BindPipe &&
+            !operation.input.empty()) {
+            opened->waitsForButton = operation.input.front() == Protocol::InterruptInEndpoint;
+        }
+        holder.unlock();
+    }
+    const bool completed = below_.Start(file, operation, record);
     if (!completed && LastError() != Errors::IoPending) {
         Ended(record, 0, false);
     }
     return completed;
-}
-
-/// The section is held over the start, so that no transfer slips in behind an interruption.
-template <class Start>
-bool InterruptibleDeviceFiles::StartTransfer(Handle file, std::uint8_t endpoint, std::uint32_t length,
-                                             Overlapped& record, Start start) try {
-    const std::lock_guard holder(section_);
-    if (IsInterrupted(file)) {
-        return Refuse(record, Errors::OperationAborted);
-    }
-    Description describe;
-    if (log_) {
-        const OpenedFile* const opened = Find(file);
-        const bool isButton = opened != nullptr && opened->waitsForButton;
-        describe = [used = isButton ? Protocol::InterruptInEndpoint : endpoint,
-                    length](std::uint32_t transferred) {
-            return Capture::DescribeData(used, transferred, length);
-        };
-    }
-    running_[&record] = {file, true, std::move(describe)};
-    return Started(record, start);
 } catch (const std::bad_alloc&) {
     return Refuse(record, Errors::NotEnoughMemory);
-}
-
-bool InterruptibleDeviceFiles::StartRead(Handle file, void* buffer, std::uint32_t length,
-                                         Overlapped& record) {
-    return StartTransfer(file, Protocol::BulkInEndpoint, length, record,
-                         [&] { return below_.StartRead(file, buffer, length, record); });
-}
-
-bool InterruptibleDeviceFiles::StartWrite(Handle file, const void* buffer, std::uint32_t length,
-                                          Overlapped& record) {
-    return StartTransfer(file, Protocol::BulkOutEndpoint, length, record,
-                         [&] { return below_.StartWrite(file, buffer, length, record); });
-}
-
-bool InterruptibleDeviceFiles::StartControl(Handle file, std::uint32_t code, const void* input,
-                                            std::uint32_t inputSize, void* output, std::uint32_t outputSize,
-                                            Overlapped& record) {
-    const std::span block(static_cast<const std::uint8_t*>(input), inputSize);
-    {
-        const std::lock_guard holder(section_);
-        // A control is short and has no pipe that could be aborted; it ends by itself.
-        if (IsInterrupted(file)) {
-            return Refuse(record, Errors::OperationAborted);
-        }
-        OpenedFile* const opened = Find(file);
-        if (opened != nullptr && code == Protocol::UsbIoDriver::Control::BindPipe && !block.empty()) {
-            opened->waitsForButton = block.front() == Protocol::InterruptInEndpoint;
-        }
-        if (const auto request = VendorRequestOf(code, block); request && log_) {
-            running_[&record] = {
-                file, false,
-                [request = *request, data = static_cast<const std::uint8_t*>(output),
-                 outputSize](std::uint32_t transferred) {
-                    const std::uint32_t known = request.isIn ? std::min(transferred, outputSize) : outputSize;
-                    return Capture::DescribeRequest(request.request, request.value, {data, known});
-                }};
-        }
-    }
-    return Started(record, [&] {
-        return below_.StartControl(file, code, input, inputSize, output, outputSize, record);
-    });
 }
 
 bool InterruptibleDeviceFiles::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred,

@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <functional>
 #include <map>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -46,10 +47,7 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
     Handle Open(const std::string& path) override;
     bool CloseFile(Handle file) override;
-    bool StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) override;
-    bool StartWrite(Handle file, const void* buffer, std::uint32_t length, Overlapped& record) override;
-    bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
-                      void* output, std::uint32_t outputSize, Overlapped& record) override;
+    bool Start(Handle file, const Platform::Operation& operation, Overlapped& record) override;
     bool GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) override;
     bool CancelTransfers(Handle file) override;
 
@@ -68,15 +66,11 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
         Description describe;  ///< empty: its end is told nobody
     };
 
-    template <class Start>
-    bool StartTransfer(Handle file, std::uint8_t endpoint, std::uint32_t length, Overlapped& record,
-                       Start start);
-    template <class Start>
-    bool Started(const Overlapped& record, Start start);
+    Description DescriptionOf(const OpenedFile* opened, const Platform::Operation& operation) const;
     void Ended(const Overlapped& record, std::uint32_t transferred, bool succeeded);
     static bool Refuse(Overlapped& record, Platform::ErrorCode code);
     void AbortPipe(const OpenedFile& file);
-    void Control(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize);
+    void Control(Handle file, std::uint32_t code, std::span<const std::uint8_t> block);
     OpenedFile* Find(Handle file);
     bool IsInterrupted(Handle file);
 

@@ -3,6 +3,7 @@
 #include <cstdio>
 #include <mutex>
 #include <new>
+#include <span>
 #include <string>
 #include <utility>
 
@@ -136,7 +137,9 @@ std::uint32_t CUsbIo::IoctlSync(std::uint32_t code, const void* input, std::uint
     std::uint32_t status = Status::Success;
     {
         const std::lock_guard hold(controlLock_);
-        if (!controlRequest_->StartControl(FileHandle, code, input, inputSize, output, outputSize)) {
+        const std::span block(static_cast<const std::uint8_t*>(input), inputSize);
+        if (!controlRequest_->Start(FileHandle,
+                                    Platform::Operation::Control(code, block, output, outputSize))) {
             status = FailureCode();
         }
         if (status == Platform::Errors::IoPending) {

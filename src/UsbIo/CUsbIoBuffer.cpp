@@ -26,17 +26,14 @@ CUsbIoBuffer::~CUsbIoBuffer() {
     CancelAndCollect();
 }
 
-bool CUsbIoBuffer::Start(Handle file, Direction direction) {
+bool CUsbIoBuffer::Start(Handle file, const Operation& operation) {
     CancelAndCollect();
     BytesTransferred = 0;
     if (!completionEvent_ || NumberOfBytesToTransfer > Size) {
         Status = completionEvent_ ? Errors::InvalidParameter : Errors::NoSystemResources;
         return false;
     }
-    const bool completedAtOnce = direction == Direction::Read
-                                     ? request_.StartRead(file, Buffer, NumberOfBytesToTransfer)
-                                     : request_.StartWrite(file, Buffer, NumberOfBytesToTransfer);
-    if (completedAtOnce) {
+    if (request_.Start(file, operation)) {
         Collect();
         return Status == Errors::Success || IsPending();
     }

@@ -39,10 +39,9 @@ class CUsbIoBuffer final {
   private:
     friend class CUsbIoPipe;
 
-    enum class Direction { Read, Write };
-
-    /// True when the transfer has completed or runs; `Status` tells which, or why not.
-    bool Start(Platform::Handle file, Direction direction);
+    /// `operation` moves `NumberOfBytesToTransfer` bytes of `Buffer`. True when the transfer has completed or
+    /// runs; `Status` tells which, or why not.
+    bool Start(Platform::Handle file, const Platform::Operation& operation);
     /// Fetches the result without waiting.
     void Collect();
     /// Cancels a transfer that still runs, waits for its end and fetches what it moved. By the thread that

@@ -6,6 +6,7 @@
 namespace Varnholt::UsbIo {
 
 using namespace Protocol::UsbIoDriver;
+using Platform::Operation;
 using Platform::WaitResult;
 
 std::uint32_t CUsbIoPipe::Bind(int deviceNumber, unsigned char endpointAddress,
@@ -23,11 +24,11 @@ std::uint32_t CUsbIoPipe::AbortPipe() {
 }
 
 bool CUsbIoPipe::Read(CUsbIoBuffer& buffer) {
-    return buffer.Start(FileHandle, CUsbIoBuffer::Direction::Read);
+    return buffer.Start(FileHandle, Operation::Read(buffer.Buffer, buffer.NumberOfBytesToTransfer));
 }
 
 bool CUsbIoPipe::Write(CUsbIoBuffer& buffer) {
-    return buffer.Start(FileHandle, CUsbIoBuffer::Direction::Write);
+    return buffer.Start(FileHandle, Operation::Write(buffer.Buffer, buffer.NumberOfBytesToTransfer));
 }
 
 std::uint32_t CUsbIoPipe::WaitForCompletion(CUsbIoBuffer& buffer, std::uint32_t timeout,

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <span>
 #include <utility>
 
 #include "Platform/Threads.h"
@@ -29,8 +30,8 @@ std::string Line(const char* what, std::uint32_t number) {
     std::snprintf(text, sizeof text, "%s %X", what, number);
     return text;
 }
-std::string Sent(const void* bytes, std::uint32_t size) {
-    return size == 0 ? "" : " " + Hex(static_cast<const std::uint8_t*>(bytes), size);
+std::string Sent(std::span<const std::uint8_t> bytes) {
+    return bytes.empty() ? "" : " " + Hex(bytes.data(), bytes.size());
 }
 std::string Room(std::uint32_t bytes) {
     return " [" + std::to_string(bytes) + "]";
@@ -163,39 +164,38 @@ bool ScriptedDriver::CloseFile(Handle handle) {
     return true;
 }
 
-bool ScriptedDriver::StartRead(Handle handle, void* buffer, std::uint32_t length, Overlapped& record) {
-    const File* const file = Find(handle);
-    return file && Start(*file, 0, Line("read", file->place) + Room(length),
-                         static_cast<std::uint8_t*>(buffer), length, {.after = Never}, record);
-}
-
-bool ScriptedDriver::StartWrite(Handle handle, const void* buffer, std::uint32_t length, Overlapped& record) {
-    const File* const file = Find(handle);
-    return file &&
-           Start(*file, 0, Line("write", file->place) + Sent(buffer, length), nullptr, length, {}, record);
-}
-
-bool ScriptedDriver::StartControl(Handle handle, std::uint32_t code, const void* input,
-                                  std::uint32_t inputSize, void* output, std::uint32_t outputSize,
-                                  Overlapped& record) {
+bool ScriptedDriver::Start(Handle handle, const Operation& operation, Overlapped& record) {
     File* const file = Find(handle);
     if (!file) {
         return false;
     }
-    const auto* const bytes = static_cast<const std::uint8_t*>(input);
-    const bool isInward = IsNative(file->path)
-                              ? bytes[Protocol::NativeDriver::Block::Direction] != 0
-                              : outputSize > 0 && code != UsbIoControl::ClassOrVendorOutRequest;
-    const bool completed = Start(*file, code,
-                                 Line("control", code) + Sent(input, inputSize) + " /" +
-                                     (isInward ? Room(outputSize) : Sent(output, outputSize)),
-                                 isInward ? static_cast<std::uint8_t*>(output) : nullptr, outputSize,
-                                 UsualAnswer(code, outputSize), record);
+    switch (operation.kind) {
+        case Operation::Kind::Read:
+            return Begin(*file, operation, Line("read", file->place) + Room(operation.length), operation.data,
+                         {.after = Never}, record);
+        case Operation::Kind::Write:
+            return Begin(*file, operation,
+                         Line("write", file->place) + Sent({operation.data, operation.length}), nullptr, {},
+                         record);
+        case Operation::Kind::Control:
+            break;
+    }
+    return Control(*file, operation, record);
+}
+
+bool ScriptedDriver::Control(File& file, const Operation& operation, Overlapped& record) {
+    const auto& [kind, data, length, code, input] = operation;
+    const bool isInward = IsNative(file.path) ? input[Protocol::NativeDriver::Block::Direction] != 0
+                                              : length > 0 && code != UsbIoControl::ClassOrVendorOutRequest;
+    const bool completed =
+        Begin(file, operation,
+              Line("control", code) + Sent(input) + " /" + (isInward ? Room(length) : Sent({data, length})),
+              isInward ? data : nullptr, UsualAnswer(code, length), record);
     if (completed && code == UsbIoControl::BindPipe) {
-        file->place = bytes[0];
+        file.place = input[0];
     }
     if (completed && code == UsbIoControl::AbortPipe) {
-        EndAll(*file);
+        EndAll(file);
     }
     return completed;
 }
@@ -212,14 +212,14 @@ Answer ScriptedDriver::TakeAnswer(std::uint32_t place, std::uint32_t code, const
     return usual;
 }
 
-bool ScriptedDriver::Start(const File& file, std::uint32_t code, std::string line, std::uint8_t* target,
-                           std::uint32_t length, const Answer& usual, Overlapped& record) {
-    const std::uint32_t place = code == 0 ? file.place : 0;
+bool ScriptedDriver::Begin(const File& file, const Operation& operation, std::string line,
+                           std::uint8_t* target, const Answer& usual, Overlapped& record) {
+    const std::uint32_t place = operation.kind == Operation::Kind::Control ? 0 : file.place;
     {
         const std::lock_guard held(lock_);
         transcript_.push_back(std::move(line));
     }
-    const Answer answer = TakeAnswer(place, code, usual);
+    const Answer answer = TakeAnswer(place, operation.code, usual);
     if (answer.onStart) {
         answer.onStart();
     }
@@ -238,7 +238,7 @@ bool ScriptedDriver::Start(const File& file, std::uint32_t code, std::string lin
         record.internal = RunningMark;
         record.internalHigh = 0;
         running_.push_back(
-            {number, &file, place, &record, target, length, std::this_thread::get_id(), answer});
+            {number, &file, place, &record, target, operation.length, std::this_thread::get_id(), answer});
     }
     if (answer.after == 0) {
         End(number, answer.code, true);

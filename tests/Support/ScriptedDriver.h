@@ -76,12 +76,8 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
     Platform::Handle Open(const std::string& path) override;
     bool CloseFile(Platform::Handle file) override;
-    bool StartRead(Platform::Handle file, void* buffer, std::uint32_t length,
-                   Platform::Overlapped& record) override;
-    bool StartWrite(Platform::Handle file, const void* buffer, std::uint32_t length,
-                    Platform::Overlapped& record) override;
-    bool StartControl(Platform::Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
-                      void* output, std::uint32_t outputSize, Platform::Overlapped& record) override;
+    bool Start(Platform::Handle file, const Platform::Operation& operation,
+               Platform::Overlapped& record) override;
     bool GetResult(Platform::Handle file, Platform::Overlapped& record, std::uint32_t& transferred,
                    bool wait) override;
     bool CancelTransfers(Platform::Handle file) override;
@@ -106,9 +102,10 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
 
     File* Find(Platform::Handle handle);
     Answer TakeAnswer(std::uint32_t place, std::uint32_t code, const Answer& usual);
-    /// `code`: of a control; 0 for others.
-    bool Start(const File& file, std::uint32_t code, std::string line, std::uint8_t* target,
-               std::uint32_t length, const Answer& usual, Platform::Overlapped& record);
+    bool Control(File& file, const Platform::Operation& operation, Platform::Overlapped& record);
+    /// `target`: null when nothing comes in.
+    bool Begin(const File& file, const Platform::Operation& operation, std::string line, std::uint8_t* target,
+               const Answer& usual, Platform::Overlapped& record);
     void End(std::uint64_t number, Platform::ErrorCode code, bool withData);
     void EndLater(std::uint64_t number, std::uint64_t microseconds, Platform::ErrorCode code, bool withData);
     void EndAll(const File& file);

@@ -59,10 +59,7 @@ class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
     Handle Open(const std::string& path) override;
     bool CloseFile(Handle file) override;
-    bool StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) override;
-    bool StartWrite(Handle file, const void* buffer, std::uint32_t length, Overlapped& record) override;
-    bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
-                      void* output, std::uint32_t outputSize, Overlapped& record) override;
+    bool Start(Handle file, const Operation& operation, Overlapped& record) override;
     bool GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) override;
     bool CancelTransfers(Handle file) override;
     void CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) override;
@@ -75,7 +72,6 @@ class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller
     };
 
     std::unique_ptr<DriverFile> OpenOnDevice(const DevicePath& path, ErrorCode& error);
-    bool Start(std::string_view call, Handle file, const Operation& operation, Overlapped& record);
 
     Usb::UsbBus& bus_;
     /// Guards the devices. It is held while devices are opened and closed, so that one which is being closed
@@ -169,9 +165,8 @@ bool DriverFileSystem::CloseFile(Handle file) {
     return true;
 }
 
-bool DriverFileSystem::Start(std::string_view call, Handle file, const Operation& operation,
-                             Overlapped& record) {
-    if (CallMustFail(call)) {
+bool DriverFileSystem::Start(Handle file, const Operation& operation, Overlapped& record) {
+    if (CallMustFail(operation.CallName())) {
         return RefuseStart(record, LastError());
     }
     const std::shared_ptr<OpenFile> open = files_.Find(file);
@@ -182,27 +177,6 @@ bool DriverFileSystem::Start(std::string_view call, Handle file, const Operation
         return RefuseStart(record, Errors::InvalidParameter);
     }
     return open->Start(operation, record);
-}
-
-bool DriverFileSystem::StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) {
-    return Start("StartRead", file,
-                 {Operation::Kind::Read, 0, {}, static_cast<std::uint8_t*>(buffer), length}, record);
-}
-
-bool DriverFileSystem::StartWrite(Handle file, const void* buffer, std::uint32_t length, Overlapped& record) {
-    // A transfer has one buffer for both directions; that of a write is only read.
-    auto* const data = static_cast<std::uint8_t*>(const_cast<void*>(buffer));
-    return Start("StartWrite", file, {Operation::Kind::Write, 0, {}, data, length}, record);
-}
-
-bool DriverFileSystem::StartControl(Handle file, std::uint32_t code, const void* input,
-                                    std::uint32_t inputSize, void* output, std::uint32_t outputSize,
-                                    Overlapped& record) {
-    const std::span<const std::uint8_t> in(static_cast<const std::uint8_t*>(input),
-                                           input != nullptr ? inputSize : 0);
-    return Start("StartControl", file,
-                 {Operation::Kind::Control, code, in, static_cast<std::uint8_t*>(output), outputSize},
-                 record);
 }
 
 bool DriverFileSystem::GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) {

@@ -3,7 +3,6 @@
 #include <cstdint>
 #include <memory>
 #include <mutex>
-#include <span>
 #include <vector>
 
 #include "Platform/DeviceFiles.h"
@@ -11,16 +10,6 @@
 #include "Platform/Drivers/RunningRequest.h"
 
 namespace Varnholt::Platform::Drivers {
-
-/// What is asked for by the start of a request.
-struct Operation {
-    enum class Kind { Read, Write, Control };
-    Kind kind;
-    std::uint32_t code = 0;               ///< control
-    std::span<const std::uint8_t> input;  ///< control
-    std::uint8_t* data = nullptr;         ///< what is read into, written from, or a control's output
-    std::uint32_t length = 0;
-};
 
 /// An open file and the requests that run on it: overlapped semantics, cancellation and closing, for
 /// whichever driver stands behind the file.
@@ -37,7 +26,7 @@ class OpenFile final : public std::enable_shared_from_this<OpenFile> {
     /// happened already.
     std::unique_ptr<DriverFile> Close();
 
-    /// As the starts of `DeviceFileSystem`.
+    /// As that of `DeviceFileSystem`.
     bool Start(const Operation& operation, Overlapped& record);
     /// Waits until the request on `record` has completed. False if no such request runs.
     bool WaitFor(const Overlapped& record);

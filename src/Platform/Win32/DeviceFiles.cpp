@@ -64,25 +64,22 @@ class WindowsDeviceFiles final : public DeviceFileSystem {
         return ::CloseHandle(file) != 0;
     }
 
-    bool StartRead(Handle file, void* buffer, std::uint32_t length, Overlapped& record) override {
+    bool Start(Handle file, const Operation& operation, Overlapped& record) override {
+        if (CallMustFail(operation.CallName())) {
+            return false;
+        }
         DWORD unused = 0;
-        return !CallMustFail("StartRead") &&
-               ::ReadFile(file, buffer, length, &unused, SystemRecord(record)) != 0;
-    }
-
-    bool StartWrite(Handle file, const void* buffer, std::uint32_t length, Overlapped& record) override {
-        DWORD unused = 0;
-        return !CallMustFail("StartWrite") &&
-               ::WriteFile(file, buffer, length, &unused, SystemRecord(record)) != 0;
-    }
-
-    bool StartControl(Handle file, std::uint32_t code, const void* input, std::uint32_t inputSize,
-                      void* output, std::uint32_t outputSize, Overlapped& record) override {
-        DWORD unused = 0;
+        OVERLAPPED* const system = SystemRecord(record);
+        const auto [kind, data, length, code, input] = operation;
+        if (kind == Operation::Kind::Read) {
+            return ::ReadFile(file, data, length, &unused, system) != 0;
+        }
+        if (kind == Operation::Kind::Write) {
+            return ::WriteFile(file, data, length, &unused, system) != 0;
+        }
         // The input is only read; the system's declaration leaves that out.
-        return !CallMustFail("StartControl") &&
-               ::DeviceIoControl(file, code, const_cast<void*>(input), inputSize, output, outputSize, &unused,
-                                 SystemRecord(record)) != 0;
+        return ::DeviceIoControl(file, code, const_cast<std::uint8_t*>(input.data()),
+                                 static_cast<DWORD>(input.size()), data, length, &unused, system) != 0;
     }
 
     bool GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) override {

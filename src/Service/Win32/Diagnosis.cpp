@@ -73,7 +73,8 @@ DriverAnswer AskUsbIo(const std::string& path) {
         UsbIo::DriverInfo::Bytes bytes{};
         std::uint32_t moved = 0;
         Platform::OverlappedRequest request(event.Get());
-        request.StartControl(file, Driver::Control::GetDriverInfo, nullptr, 0, bytes.data(), bytes.size());
+        request.Start(file, Platform::Operation::Control(Driver::Control::GetDriverInfo, {}, bytes.data(),
+                                                         bytes.size()));
         if (request.GetResult(moved, true)) {
             answer.version = UsbIo::DriverInfo::Decode(bytes).interfaceVersion;
         } else {

@@ -40,8 +40,8 @@ class Round final {
     void Play() {
         Request measure;
         const auto block = NativeBlock(static_cast<std::uint8_t>(Protocol::Request::Measure), 0);
-        files_->StartControl(main_, Native::ControlVendorRequest, block.data(), 10, nullptr, 0,
-                             measure.record);
+        files_->Start(main_, Platform::Operation::Control(Native::ControlVendorRequest, block, nullptr, 0),
+                      measure.record);
         {
             Platform::TestThread other([this, pause = Pause()] { Interfere(pause); });
             Start(reads_[0]);
@@ -89,7 +89,8 @@ class Round final {
 
     void Start(Read& read) {
         const auto length = static_cast<std::uint32_t>(read.buffer.size());
-        read.started = files_->StartRead(pipe_, read.buffer.data(), length, read.request.record) ||
+        read.started = files_->Start(pipe_, Platform::Operation::Read(read.buffer.data(), length),
+                                     read.request.record) ||
                        Platform::LastError() == Errors::IoPending;
         EXPECT_TRUE(read.started || Platform::LastError() == Errors::InvalidHandle);
         closed_ = closed_ || !read.started;
@@ -122,8 +123,9 @@ class Round final {
         const auto block = NativeBlock(0, 0, Protocol::BulkInEndpoint);
         while (!done_) {
             Request abort;
-            EXPECT_TRUE(files_->StartControl(main_, Native::ControlAbortPipe, block.data(), 10, nullptr, 0,
-                                             abort.record));
+            EXPECT_TRUE(files_->Start(
+                main_, Platform::Operation::Control(Native::ControlAbortPipe, block, nullptr, 0),
+                abort.record));
             Platform::SleepMilliseconds(pause);
         }
     }

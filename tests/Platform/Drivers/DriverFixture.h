@@ -103,10 +103,11 @@ class DriverFixture : public testing::Test {
     }
     Outcome Control(Platform::Handle file, std::uint32_t code, const Bytes& input, Bytes& output) {
         Request request;
-        return Finish(
-            file, request,
-            files_->StartControl(file, code, input.data(), static_cast<std::uint32_t>(input.size()),
-                                 output.data(), static_cast<std::uint32_t>(output.size()), request.record));
+        return Finish(file, request,
+                      files_->Start(file,
+                                    Platform::Operation::Control(code, input, output.data(),
+                                                                 static_cast<std::uint32_t>(output.size())),
+                                    request.record));
     }
     Outcome Read(Platform::Handle file, Bytes& buffer) {
         Request request;
@@ -116,11 +117,14 @@ class DriverFixture : public testing::Test {
         Request request;
         return Finish(
             file, request,
-            files_->StartWrite(file, data.data(), static_cast<std::uint32_t>(data.size()), request.record));
+            files_->Start(file,
+                          Platform::Operation::Write(data.data(), static_cast<std::uint32_t>(data.size())),
+                          request.record));
     }
     bool StartRead(Platform::Handle file, Bytes& buffer, Request& request) {
-        return files_->StartRead(file, buffer.data(), static_cast<std::uint32_t>(buffer.size()),
-                                 request.record);
+        return files_->Start(
+            file, Platform::Operation::Read(buffer.data(), static_cast<std::uint32_t>(buffer.size())),
+            request.record);
     }
     /// Starts a read that must stay pending.
     void StartPending(Platform::Handle file, Bytes& buffer, Request& request) {

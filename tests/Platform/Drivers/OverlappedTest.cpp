@@ -151,7 +151,8 @@ TEST_F(OverlappedFiles, RefuseHandlesThatNameNothing) {
         EXPECT_EQ(ErrorOf(files_->CancelTransfers(handle)), Errors::InvalidHandle);
         EXPECT_EQ(ErrorOf(files_->CloseFile(handle)), Errors::InvalidHandle);
     }
-    EXPECT_EQ(ErrorOf(files_->StartRead(reopened, nullptr, 1, request_.record)), Errors::InvalidParameter);
+    EXPECT_EQ(ErrorOf(files_->Start(reopened, Platform::Operation::Read(nullptr, 1), request_.record)),
+              Errors::InvalidParameter);
     EXPECT_FALSE(Platform::Close(reopened)) << "not a waitable object";
     EXPECT_EQ(Platform::Wait(reopened, 0), WaitResult::Failed);
 }

@@ -39,7 +39,7 @@ class SystemDeviceFilesTest : public testing::Test {
     }
     /// Starts a read that finds nothing to read.
     void StartPendingRead(Overlapped& record, std::array<char, 8>& buffer) {
-        ASSERT_FALSE(SystemDeviceFiles().StartRead(file_, buffer.data(), buffer.size(), record));
+        ASSERT_FALSE(SystemDeviceFiles().Start(file_, Operation::Read(buffer.data(), buffer.size()), record));
         ASSERT_EQ(LastError(), Errors::IoPending);
     }
     std::uint32_t ResultOf(Overlapped& record, bool wait) {
@@ -106,12 +106,13 @@ TEST_F(SystemDeviceFilesTest, RequestEndsItsReadBeforeItsBufferGoes) {
     {
         std::array<char, 8> buffer{};
         OverlappedRequest request(event_.Get());
-        request.StartRead(file_, buffer.data(), buffer.size());
+        request.Start(file_, Operation::Read(buffer.data(), buffer.size()));
         EXPECT_TRUE(request.IsRunning());
     }
     // Nobody is left to take these bytes but the next read.
     Send("abc");
-    EXPECT_TRUE(SystemDeviceFiles().StartRead(file_, firstBuffer_.data(), firstBuffer_.size(), first_));
+    EXPECT_TRUE(
+        SystemDeviceFiles().Start(file_, Operation::Read(firstBuffer_.data(), firstBuffer_.size()), first_));
     EXPECT_EQ(ResultOf(first_, false), Errors::Success);
     EXPECT_EQ(std::string(firstBuffer_.data(), moved_), "abc");
 }

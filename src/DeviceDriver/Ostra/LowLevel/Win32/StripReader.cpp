@@ -20,7 +20,7 @@ StripReader::StripReader(const USBConnection& connection, std::uint32_t chunk)
 
 void StripReader::Start(std::uint32_t size) {
     following_->asked = size;
-    following_->request.StartRead(pipe_, following_->buffer.get(), size);
+    following_->request.Start(pipe_, Platform::Operation::Read(following_->buffer.get(), size));
 }
 
 /// Both reads complete through the connection's one auto-reset event, so that a signal says only that some

@@ -11,6 +11,7 @@ namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace {
 
 using Platform::NoHandle;
+using Platform::Operation;
 using Platform::OverlappedRequest;
 using Platform::WaitResult;
 
@@ -76,8 +77,7 @@ std::uint32_t USBConnection::PerformDeviceIOControl(const Protocol::NativeDriver
                                                     bool reportFailures) try {
     Platform::SleepMilliseconds(1);
     OverlappedRequest request(CompletionEvent());
-    request.StartControl(pipeHandle_, code, block.data(), static_cast<std::uint32_t>(block.size()), data,
-                         length);
+    request.Start(pipeHandle_, Operation::Control(code, block, data, length));
     const WaitResult waited = Platform::Wait(request.CompletionEvent(), ControlWaitLimit);
     if (!reportFailures) {
         return 0;
@@ -97,14 +97,14 @@ TRACED
 
 void USBConnection::Read(void* buffer, std::uint32_t length, std::uint32_t timeout) try {
     OverlappedRequest request(CompletionEvent());
-    request.StartRead(pipeHandle_, buffer, length);
+    request.Start(pipeHandle_, Operation::Read(buffer, length));
     CompleteOverlappedIO(request, length, timeout, "read");
 }
 TRACED
 
 void USBConnection::Write(const void* buffer, std::uint32_t length, std::uint32_t timeout) try {
     OverlappedRequest request(CompletionEvent());
-    request.StartWrite(pipeHandle_, buffer, length);
+    request.Start(pipeHandle_, Operation::Write(buffer, length));
     CompleteOverlappedIO(request, length, timeout, "write");
 }
 TRACED
@@ -112,7 +112,7 @@ TRACED
 std::uint32_t USBConnection::Read(std::vector<std::uint8_t>& buffer,
                                   const std::atomic<bool>& endRequested) try {
     OverlappedRequest request(CompletionEvent());
-    request.StartRead(pipeHandle_, buffer.data(), static_cast<std::uint32_t>(buffer.size()));
+    request.Start(pipeHandle_, Operation::Read(buffer.data(), static_cast<std::uint32_t>(buffer.size())));
     if (!request.IsRunning()) {
         return 0;  // nothing would ever end the wait: not only when the access was denied
     }
