@@ -69,19 +69,24 @@ std::unique_ptr<Drivers::DriverFile> StandInInstrumentObject::Open(bool usbIo, s
         }
     }
     if (!shared) {
-        shared = std::make_shared<Drivers::SharedDevice>(Bus(), name_);
+        const auto abort = [this](const Drivers::SharedDevice&, std::uint8_t endpoint) {
+            for (const auto& file : Files()) {
+                file->CancelEndpoint(endpoint);
+            }
+        };
+        shared = std::make_shared<Drivers::SharedDevice>(Bus(), name_, abort);
         device_ = shared;
         usbIoDevice_.reset();
     }
     if (!usbIo) {
-        return Drivers::NativeDriverFile::Open(std::move(shared), pipe, *this, error);
+        return Drivers::NativeDriverFile::Open(std::move(shared), pipe, error);
     }
     std::shared_ptr<Drivers::UsbIoDevice> opened = usbIoDevice_.lock();
     if (!opened) {
         opened = std::make_shared<Drivers::UsbIoDevice>(std::move(shared));
         usbIoDevice_ = opened;
     }
-    return std::make_unique<Drivers::UsbIoDriverFile>(std::move(opened), *this);
+    return std::make_unique<Drivers::UsbIoDriverFile>(std::move(opened));
 }
 
 void StandInInstrumentObject::Add(StandInFileObject& file) {
@@ -97,12 +102,6 @@ void StandInInstrumentObject::Remove(StandInFileObject& file) {
 std::size_t StandInInstrumentObject::OpenFiles() {
     const std::lock_guard held(lock_);
     return files_.size();
-}
-
-void StandInInstrumentObject::CancelEndpoint(const Drivers::SharedDevice&, std::uint8_t endpoint) {
-    for (const auto& file : Files()) {
-        file->CancelEndpoint(endpoint);
-    }
 }
 
 std::vector<std::shared_ptr<StandInFileObject>> StandInInstrumentObject::Files() {

@@ -18,10 +18,10 @@ class StandInFileObject;
 
 /// One plugged-in instrument behind a stand-in driver, with what the driver keeps of it. Lives as long as its
 /// device or a file of it.
-class StandInInstrumentObject final : public Platform::Drivers::EndpointCanceller {
+class StandInInstrumentObject final {
   public:
     explicit StandInInstrumentObject(unsigned long index);
-    ~StandInInstrumentObject() override;
+    ~StandInInstrumentObject();
 
     void Unplug();
     bool IsUnplugged() const { return unplugged_; }
@@ -32,8 +32,6 @@ class StandInInstrumentObject final : public Platform::Drivers::EndpointCancelle
     void Add(StandInFileObject& file);
     void Remove(StandInFileObject& file);
     std::size_t OpenFiles();
-
-    void CancelEndpoint(const Platform::Drivers::SharedDevice& device, std::uint8_t endpoint) override;
 
     SimulatedInstrument& Simulated();
     void SetFaults(const std::string& plan);

@@ -27,20 +27,12 @@ struct Decision {
     static Decision Send() { return {Kind::Send, Errors::Success, 0}; }
 };
 
-/// Ends what runs on an endpoint of a device, whichever file and thread started it.
-class EndpointCanceller {
-  public:
-    virtual ~EndpointCanceller() = default;
-    virtual void CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) = 0;
-};
-
 /// A driver's side of one open file: which requests it takes, what they become on the bus, and its codes. One
 /// per handle; destroyed when the handle is closed and all its requests have completed. All operations may be
 /// called from any thread.
 class DriverFile {
   public:
-    DriverFile(std::shared_ptr<SharedDevice> shared, EndpointCanceller& endpointCanceller)
-        : device_(std::move(shared)), canceller_(endpointCanceller) {}
+    explicit DriverFile(std::shared_ptr<SharedDevice> shared) : device_(std::move(shared)) {}
     virtual ~DriverFile() = default;
     DriverFile(const DriverFile&) = delete;
     DriverFile& operator=(const DriverFile&) = delete;
@@ -67,13 +59,12 @@ class DriverFile {
 
   protected:
     Decision Abort(std::uint8_t endpoint) const {
-        canceller_.CancelEndpoint(*device_, endpoint);
+        device_->AbortEndpoint(endpoint);
         return Decision::Done(0);
     }
 
   private:
     const std::shared_ptr<SharedDevice> device_;
-    EndpointCanceller& canceller_;
 };
 
 }  // namespace Varnholt::Platform::Drivers

@@ -50,7 +50,7 @@ constexpr std::uintptr_t FirstHandle = 0x80000002;
 /// More than any host needs: one that forgets to close files is told.
 constexpr std::size_t MostOpenFiles = 1024;
 
-class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller {
+class DriverFileSystem final : public DeviceFileSystem {
   public:
     explicit DriverFileSystem(Usb::UsbBus& usbBus) : bus_(usbBus) {}
     /// Closes what was left open; nobody else is in here any more.
@@ -62,7 +62,6 @@ class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller
     bool Start(Handle file, const Operation& operation, Overlapped& record) override;
     bool GetResult(Handle file, Overlapped& record, std::uint32_t& transferred, bool wait) override;
     bool CancelTransfers(Handle file) override;
-    void CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint) override;
 
   private:
     /// What the open files of one instrument share. It ends with the last of them.
@@ -72,6 +71,7 @@ class DriverFileSystem final : public DeviceFileSystem, public EndpointCanceller
     };
 
     std::unique_ptr<DriverFile> OpenOnDevice(const DevicePath& path, ErrorCode& error);
+    void CancelEndpoint(const SharedDevice& device, std::uint8_t endpoint);
 
     Usb::UsbBus& bus_;
     /// Guards the devices. It is held while devices are opened and closed, so that one which is being closed
@@ -134,18 +134,21 @@ std::unique_ptr<DriverFile> DriverFileSystem::OpenOnDevice(const DevicePath& pat
     std::shared_ptr<SharedDevice> device = open.device.lock();
     if (!device || device->IsGone()) {
         // A device that was unplugged stays gone for the files that are open on it; this is another one.
-        device = std::make_shared<SharedDevice>(bus_, path.name);
+        const auto abort = [this](const SharedDevice& aborted, std::uint8_t endpoint) {
+            CancelEndpoint(aborted, endpoint);
+        };
+        device = std::make_shared<SharedDevice>(bus_, path.name, abort);
         open = {device, {}};
     }
     if (!path.isUsbIo) {
-        return NativeDriverFile::Open(std::move(device), path.pipe, *this, error);
+        return NativeDriverFile::Open(std::move(device), path.pipe, error);
     }
     std::shared_ptr<UsbIoDevice> usbIo = open.usbIo.lock();
     if (!usbIo) {
         usbIo = std::make_shared<UsbIoDevice>(std::move(device));
         open.usbIo = usbIo;
     }
-    return std::make_unique<UsbIoDriverFile>(std::move(usbIo), *this);
+    return std::make_unique<UsbIoDriverFile>(std::move(usbIo));
 }
 
 bool DriverFileSystem::CloseFile(Handle file) {

@@ -35,11 +35,8 @@ bool IsVendorRequest(const std::uint8_t* block) {
 }  // namespace
 
 std::unique_ptr<NativeDriverFile> NativeDriverFile::Open(std::shared_ptr<SharedDevice> shared,
-                                                         std::uint32_t pipeNumber,
-                                                         EndpointCanceller& endpointCanceller,
-                                                         ErrorCode& error) {
-    std::unique_ptr<NativeDriverFile> file(
-        new NativeDriverFile(std::move(shared), Endpoints[pipeNumber], endpointCanceller));
+                                                         std::uint32_t pipeNumber, ErrorCode& error) {
+    std::unique_ptr<NativeDriverFile> file(new NativeDriverFile(std::move(shared), Endpoints[pipeNumber]));
     error = file->Device().Claim();
     file->isClaimed_ = error == Errors::Success;
     if (file->isClaimed_ && file->endpoint_ != 0) {

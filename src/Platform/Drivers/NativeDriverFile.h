@@ -18,8 +18,7 @@ class NativeDriverFile final : public DriverFile {
     /// Claims the device. Null on failure with the code in `error`; `Errors::FileNotFound` where the device
     /// has no such endpoint.
     static std::unique_ptr<NativeDriverFile> Open(std::shared_ptr<SharedDevice> shared,
-                                                  std::uint32_t pipeNumber,
-                                                  EndpointCanceller& endpointCanceller, ErrorCode& error);
+                                                  std::uint32_t pipeNumber, ErrorCode& error);
     ~NativeDriverFile() override;
 
     Decision Move(bool in, Usb::Transfer& transfer) override;
@@ -34,9 +33,8 @@ class NativeDriverFile final : public DriverFile {
     ErrorCode RefusalOf(ErrorCode usbCode) const override { return usbCode; }
 
   private:
-    NativeDriverFile(std::shared_ptr<SharedDevice> shared, std::uint8_t pipeEndpoint,
-                     EndpointCanceller& endpointCanceller)
-        : DriverFile(std::move(shared), endpointCanceller), endpoint_(pipeEndpoint) {}
+    NativeDriverFile(std::shared_ptr<SharedDevice> shared, std::uint8_t pipeEndpoint)
+        : DriverFile(std::move(shared)), endpoint_(pipeEndpoint) {}
     Decision AbortPipe(std::uint16_t endpoint) const;
 
     const std::uint8_t endpoint_;  ///< 0: the device itself

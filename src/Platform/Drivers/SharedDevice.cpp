@@ -18,8 +18,8 @@ std::uint32_t BitOf(std::uint8_t endpoint) {
 
 }  // namespace
 
-SharedDevice::SharedDevice(Usb::UsbBus& usbBus, std::string nameOnBus)
-    : bus_(usbBus), name_(std::move(nameOnBus)) {}
+SharedDevice::SharedDevice(Usb::UsbBus& usbBus, std::string nameOnBus, Abort abort)
+    : bus_(usbBus), name_(std::move(nameOnBus)), abort_(std::move(abort)) {}
 
 ErrorCode SharedDevice::Claim() {
     const std::lock_guard holder(setup_);

@@ -2,6 +2,7 @@
 
 #include <atomic>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <string>
 
@@ -14,7 +15,10 @@ namespace Varnholt::Platform::Drivers {
 /// the object. All operations may be called from any thread.
 class SharedDevice final {
   public:
-    SharedDevice(Usb::UsbBus& usbBus, std::string nameOnBus);
+    /// `abort` ends what runs on an endpoint of the device, whichever file and thread started it.
+    using Abort = std::function<void(const SharedDevice& device, std::uint8_t endpoint)>;
+
+    SharedDevice(Usb::UsbBus& usbBus, std::string nameOnBus, Abort abort);
     SharedDevice(const SharedDevice&) = delete;
     SharedDevice& operator=(const SharedDevice&) = delete;
 
@@ -31,6 +35,7 @@ class SharedDevice final {
     /// Hands a transfer of a claimed device to it, after clearing a halt of its endpoint.
     ErrorCode Submit(Usb::Transfer& transfer);
     void Cancel(Usb::Transfer& transfer);
+    void AbortEndpoint(std::uint8_t endpoint) const { abort_(*this, endpoint); }
     /// As `UsbDevice::CompletionsOf`, of a claimed device.
     std::shared_ptr<CompletionSource> CompletionsOf(std::uint8_t endpoint);
     /// Remembers what the end of a transfer says about the device. Before the end is made known.
@@ -46,6 +51,7 @@ class SharedDevice final {
 
     Usb::UsbBus& bus_;
     const std::string name_;
+    const Abort abort_;
 
     RecursiveMutex setup_;  ///< guards opening, the claim and the clearing of halts, all of which may block
     std::uint32_t claims_ = 0;                ///< guarded by `setup`

@@ -61,9 +61,8 @@ Decision DriverInfo(std::span<std::uint8_t> output) {
 
 }  // namespace
 
-UsbIoDriverFile::UsbIoDriverFile(std::shared_ptr<UsbIoDevice> usbIoDevice,
-                                 EndpointCanceller& endpointCanceller)
-    : DriverFile(usbIoDevice->Shared(), endpointCanceller), usbIo_(std::move(usbIoDevice)) {}
+UsbIoDriverFile::UsbIoDriverFile(std::shared_ptr<UsbIoDevice> usbIoDevice)
+    : DriverFile(usbIoDevice->Shared()), usbIo_(std::move(usbIoDevice)) {}
 
 UsbIoDriverFile::~UsbIoDriverFile() {
     if (binding_ != 0) {

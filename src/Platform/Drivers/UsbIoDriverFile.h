@@ -18,7 +18,7 @@ namespace Varnholt::Platform::Drivers {
 /// but the driver information ends with `Status::DeviceRemoved`.
 class UsbIoDriverFile final : public DriverFile {
   public:
-    UsbIoDriverFile(std::shared_ptr<UsbIoDevice> usbIoDevice, EndpointCanceller& endpointCanceller);
+    explicit UsbIoDriverFile(std::shared_ptr<UsbIoDevice> usbIoDevice);
     /// Unbinds.
     ~UsbIoDriverFile() override;
 
