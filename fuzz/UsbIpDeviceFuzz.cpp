@@ -8,6 +8,7 @@
 
 #include "Platform/Usb/UsbDescriptors.h"
 #include "Platform/Usb/UsbIpDevice.h"
+#include "Platform/Usb/UsbIpOperations.h"
 #include "Support/TestTransfer.h"
 
 using namespace Varnholt::Platform;
@@ -34,7 +35,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* input, std::size_t siz
         return ends[0];
     };
     if (size % 4 == 0) {
-        ListUsbIpDevices(connect);
+        UsbIpSocket socket(ends[0]);
+        connected = true;
+        ListUsbIpDevices(socket);
     } else {
         std::array transfers{
             TestTransfer::VendorQuestion(Varnholt::Protocol::Request::GetMisc, 64),

@@ -13,6 +13,7 @@
 #include "Platform/Linux/FileDescriptor.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/UsbIpDevice.h"
+#include "Platform/Usb/UsbIpOperations.h"
 
 namespace Varnholt::Platform::Usb {
 namespace {
@@ -79,8 +80,9 @@ UsbIpConnector ConnectorTo(const std::string& name) {
 }
 
 /// Finds out who uses it: the simulator writes who has opened the instrument behind its path.
-void AskForUser(const std::string& name, SimulatorInfo& info) {
-    const auto records = ListUsbIpDevices(ConnectorTo(name));
+void AskForUser(Linux::FileDescriptor file, SimulatorInfo& info) {
+    UsbIpSocket socket(file.Release());
+    const auto records = ListUsbIpDevices(socket);
     info.answers = records && !records->empty();
     if (!info.answers) {
         return;
@@ -137,9 +139,8 @@ std::vector<SimulatorInfo> ListSimulators() {
     for (const std::string& name : ListeningSockets()) {
         if (auto connection = Connect(name)) {
             SimulatorInfo& info = simulators.emplace_back(std::move(connection->info));
-            connection.reset();
             if (info.usable) {
-                AskForUser(name, info);
+                AskForUser(std::move(connection->file), info);
             }
         } else if (errno == EAGAIN) {
             SimulatorInfo& silent = simulators.emplace_back();

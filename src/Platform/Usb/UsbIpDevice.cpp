@@ -13,6 +13,7 @@
 #include "Platform/Linux/HostSignalsBlocked.h"
 #include "Platform/LookUp.h"
 #include "Platform/Usb/UsbDescriptors.h"
+#include "Platform/Usb/UsbIpOperations.h"
 #include "Platform/Usb/UsbIpSocket.h"
 
 namespace Varnholt::Platform::Usb {
@@ -119,11 +120,12 @@ ErrorCode UsbIpDevice::Claim() {
         const std::lock_guard lock(mutex_);
         return connected_ ? Errors::Success : Errors::DeviceNotConnected;
     }
-    ErrorCode error = Errors::Success;
-    std::unique_ptr<UsbIpSocket> newSocket = ConnectUsbIp(connect_, error);
-    if (!newSocket) {
+    ErrorCode error = Errors::DeviceNotConnected;
+    const int file = connect_(error);
+    if (file < 0) {
         return error;
     }
+    auto newSocket = std::make_unique<UsbIpSocket>(file);
     if (error = ImportUsbIpDevice(*newSocket, busId_, deviceId_); error != Errors::Success) {
         return error;
     }

@@ -1,12 +1,16 @@
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <string>
 
 #include "Platform/Usb/UsbDevice.h"
-#include "Platform/Usb/UsbIpOperations.h"
 
 namespace Varnholt::Platform::Usb {
+
+/// Makes a connection to the peer that exports a device: a connected stream socket, which the caller takes
+/// over, or -1 with the reason in `error`.
+using UsbIpConnector = std::function<int(ErrorCode& error)>;
 
 /// The device with the bus id `busId` that a USB/IP peer exports. It is imported when it is claimed, and the
 /// connection lasts as long as the claim; so does the thread that reads from it. A peer that closes the

@@ -37,12 +37,6 @@ ErrorCode ErrorOfImport(UsbIp::OperationStatus status) {
 
 }  // namespace
 
-std::unique_ptr<UsbIpSocket> ConnectUsbIp(const UsbIpConnector& connect, ErrorCode& error) {
-    error = Errors::DeviceNotConnected;
-    const int file = connect(error);
-    return file < 0 ? nullptr : std::make_unique<UsbIpSocket>(file);
-}
-
 ErrorCode ImportUsbIpDevice(UsbIpSocket& socket, const std::string& busId, std::uint32_t& deviceId) {
     const UsbIp::BusIdBytes id = UsbIp::EncodeBusId(busId);
     const auto reply = Ask(socket, UsbIp::Operation::ImportRequest, id, UsbIp::Operation::ImportReply);
@@ -60,17 +54,12 @@ ErrorCode ImportUsbIpDevice(UsbIpSocket& socket, const std::string& busId, std::
     return Errors::Success;
 }
 
-std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(const UsbIpConnector& connect) {
+std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(UsbIpSocket& socket) {
     constexpr std::uint32_t mostDevices = 256;
-    ErrorCode error = Errors::Success;
-    const auto socket = ConnectUsbIp(connect, error);
-    if (!socket) {
-        return std::nullopt;
-    }
-    socket->ReceiveUntil(UsbIpSocket::Clock::now() + ListPatience);
-    const auto reply = Ask(*socket, UsbIp::Operation::ListRequest, {}, UsbIp::Operation::ListReply);
+    socket.ReceiveUntil(UsbIpSocket::Clock::now() + ListPatience);
+    const auto reply = Ask(socket, UsbIp::Operation::ListRequest, {}, UsbIp::Operation::ListReply);
     std::array<std::uint8_t, UsbIp::ListCountSize> countBytes{};
-    if (!reply || reply->status != UsbIp::OperationStatus::Ok || !socket->Receive(countBytes, true)) {
+    if (!reply || reply->status != UsbIp::OperationStatus::Ok || !socket.Receive(countBytes, true)) {
         return std::nullopt;
     }
     const std::uint32_t count = Protocol::LoadBig32(countBytes.data());
@@ -80,12 +69,12 @@ std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(const UsbIpConn
     std::vector<UsbIp::DeviceRecord> records;
     for (std::uint32_t i = 0; i < count; ++i) {
         UsbIp::DeviceRecordBytes bytes{};
-        if (!socket->Receive(bytes, true)) {
+        if (!socket.Receive(bytes, true)) {
             return std::nullopt;
         }
         records.push_back(UsbIp::DecodeDeviceRecord(bytes));
         std::vector<std::uint8_t> interfaces(records.back().interfaces * UsbIp::InterfaceRecordSize);
-        if (!socket->Receive(interfaces, true)) {
+        if (!socket.Receive(interfaces, true)) {
             return std::nullopt;
         }
     }

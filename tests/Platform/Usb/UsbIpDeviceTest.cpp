@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "Platform/Usb/UsbIpDevice.h"
+#include "Platform/Usb/UsbIpProtocol.h"
 #include "Platform/Usb/UsbIpSocket.h"
 #include "Support/Bytes.h"
 #include "Support/SignalMasks.h"
