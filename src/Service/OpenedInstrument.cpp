@@ -35,7 +35,7 @@ OpenedInstrument::OpenedInstrument(Context& usedContext, const FoundInstrument& 
     try {
         transport_ =
             Transport::Instance(listener, static_cast<std::uint32_t>(found.index), context_.UsedTransport());
-        transport_->SetDataStageObserver(&wholeData_);
+        transport_->RequireWholeData();
         transport_->GetDeviceIdentifier(opened);
         if (opened == identifier_) {
             commands_ = Commands(new CommandSet(transport_));

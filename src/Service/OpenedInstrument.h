@@ -5,7 +5,6 @@
 #include <string>
 
 #include "DeviceDriver/Generic/EventListener.h"
-#include "DeviceDriver/Ostra/LowLevel/DataStageObserver.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
 #include "Service/Instruments.h"
 
@@ -76,7 +75,6 @@ class OpenedInstrument final {
     const std::string identifier_;
     const Claim claim_{identifier_};  ///< until what follows is closed
     DeviceDriver::Generic::EventListener* const messageListener_;
-    DeviceDriver::Ostra::LowLevel::WholeDataStages wholeData_;  ///< told by the transport
     Utilities::Tools::SmartPointer<Transport> transport_;
     Commands commands_;
 };

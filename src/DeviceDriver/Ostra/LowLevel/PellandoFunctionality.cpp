@@ -62,11 +62,6 @@ void PellandoFunctionality::SetScanReceiver(ScanReceiver* receiver) try {
 }
 TRACED
 
-void PellandoFunctionality::SetDataStageObserver(DataStageObserver* observer) try {
-    implementation_->SetDataStageObserver(observer);
-}
-TRACED
-
 void PellandoFunctionality::MeasureRequest(std::uint8_t* buffer, std::uint32_t length,
                                            std::uint32_t timeoutSeconds) try {
     implementation_->MeasureRequest(buffer, length, timeoutSeconds);

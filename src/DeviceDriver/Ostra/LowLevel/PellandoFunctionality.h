@@ -27,7 +27,6 @@ class PellandoFunctionality final {
     void removeListener(Generic::EventListener* listener);
     /// See `PellandoFunctionalityByte`.
     void SetScanReceiver(ScanReceiver* receiver);
-    void SetDataStageObserver(DataStageObserver* observer);
 
     /// Takes one readout of `length` bytes into `buffer`; 256 bytes are 128 readings of 2 bytes, most
     /// significant byte first.

@@ -5,7 +5,6 @@
 #include <string>
 
 #include "DeviceDriver/Generic/EventListener.h"
-#include "DeviceDriver/Ostra/LowLevel/DataStageObserver.h"
 #include "DeviceDriver/Ostra/LowLevel/ScanReceiver.h"
 #include "DeviceDriver/Ostra/Transport.h"
 #include "Utilities/Tools/SmartPointer.h"
@@ -26,12 +25,16 @@ class PellandoFunctionalityByte {
   public:
     virtual ~PellandoFunctionalityByte() = default;
 
-    /// Neither is owned; both may be null, as they are at first, and change between commands. Without a
-    /// receiver the data of a scan wait for `GetScanData`. With one nothing is kept; what a transfer brought
-    /// that then failed is handed over too, before the failure leaves `StartScan`; each transfer of the scan
-    /// gets the time-out plus 3000 ms on either transport; and an open-ended scan may be of any length.
+    /// Not owned; may be null, as it is at first, and change between commands. Without a receiver the data of
+    /// a scan wait for `GetScanData`. With one nothing is kept; what a transfer brought that then failed is
+    /// handed over too, before the failure leaves `StartScan`; each transfer of the scan gets the time-out
+    /// plus 3000 ms on either transport; and an open-ended scan may be of any length.
     void SetScanReceiver(ScanReceiver* receiver) { scanReceiver_ = receiver; }
-    void SetDataStageObserver(DataStageObserver* observer) { dataStageObserver_ = observer; }
+    /// From then on a command whose data did not move as a whole is a failure: `IOException` "M of N bytes
+    /// came", with the numbers as its `MissingData`; scans are left alone. For whoever relies on what was
+    /// read: a transport may call a read that brought less than it should a success, and leave the rest as it
+    /// was.
+    void RequireWholeData() { requiresWholeData_ = true; }
 
     /// No message reaches any listener once this has returned.
     virtual void RemoveListener(Generic::EventListener* listener) = 0;
@@ -80,15 +83,12 @@ class PellandoFunctionalityByte {
 
   protected:
     ScanReceiver* Receiver() const { return scanReceiver_; }
-    void DataStageEnded(std::uint32_t asked, std::uint32_t moved) const {
-        if (dataStageObserver_ != nullptr) {
-            dataStageObserver_->DataStageEnded(asked, moved);
-        }
-    }
+    /// Of a command, either way, once for each data stage that succeeded; not of a scan.
+    void DataStageEnded(std::uint32_t asked, std::uint32_t moved) const;
 
   private:
     ScanReceiver* scanReceiver_ = nullptr;
-    DataStageObserver* dataStageObserver_ = nullptr;
+    bool requiresWholeData_ = false;
 };
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel

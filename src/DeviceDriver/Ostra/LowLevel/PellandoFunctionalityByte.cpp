@@ -1,13 +1,11 @@
-#include "DeviceDriver/Ostra/LowLevel/DataStageObserver.h"
-
-#include <string>
+#include "DeviceDriver/Ostra/LowLevel/PellandoFunctionalityByte.h"
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
-void WholeDataStages::DataStageEnded(std::uint32_t asked, std::uint32_t moved) {
-    if (moved != asked) {
+void PellandoFunctionalityByte::DataStageEnded(std::uint32_t asked, std::uint32_t moved) const {
+    if (requiresWholeData_ && moved != asked) {
         throw IOException(std::to_string(moved) + " of " + std::to_string(asked) + " bytes came", Here(),
                           Shortfall{moved, asked});
     }
