@@ -60,36 +60,6 @@ SimulatedInstrument::Endpoint* SimulatedInstrument::FindEndpoint(std::uint8_t ad
                : &endpoints_[static_cast<std::size_t>(found - Simulator::Endpoints.begin())];
 }
 
-ErrorCode SimulatedInstrument::Claim(const Attachment& attachment) {
-    {
-        const std::lock_guard lock(mutex_);
-        if (!Attached(attachment)) {
-            return Errors::DeviceNotConnected;
-        }
-        if (claimedBy_) {
-            return Errors::Busy;
-        }
-        claimedBy_ = &attachment;
-        configuration_ = ConfigurationValue;
-    }
-    if (settings_.buttonAfterMilliseconds) {
-        buttonAlarm_.RingNoLaterThan(scheduler_.Now() +
-                                     *settings_.buttonAfterMilliseconds * MicrosecondsPerMillisecond);
-    }
-    return Errors::Success;
-}
-
-void SimulatedInstrument::Release(const Attachment& attachment) {
-    {
-        const std::lock_guard lock(mutex_);
-        if (claimedBy_ != &attachment) {
-            return;
-        }
-        claimedBy_ = nullptr;
-    }
-    buttonAlarm_.Clear();
-}
-
 template <class Change>
 void SimulatedInstrument::Do(Change change) {
     const std::uint64_t now = timed_ ? scheduler_.Now() * NanosecondsPerMicrosecond : 0;
@@ -114,20 +84,97 @@ void SimulatedInstrument::Do(Change change) {
     done.Deliver();
 }
 
-ErrorCode SimulatedInstrument::Submit(const Attachment& attachment, Transfer& transfer) try {
+/// One opening of the instrument.
+class SimulatedInstrument::Connection final : public Platform::Usb::UsbDevice {
+  public:
+    Connection(std::shared_ptr<SimulatedInstrument> connected, std::uint64_t connectedAt)
+        : instrument_(std::move(connected)), plugging_(connectedAt) {}
+    ~Connection() override;
+
+    std::vector<Platform::Usb::EndpointInfo> Endpoints(ErrorCode& error) override {
+        error = Errors::Success;
+        return {Simulator::Endpoints.begin(), Simulator::Endpoints.end()};
+    }
+    ErrorCode Claim() override;
+    void Release() override;
+    ErrorCode Submit(Transfer& transfer) override;
+    void Cancel(Transfer& transfer) override;
+    ErrorCode ClearHalt(std::uint8_t address) override;
+
+  private:
+    /// With the instrument's lock held.
+    bool IsAttached() const { return instrument_->pluggedIn_ && instrument_->plugging_ == plugging_; }
+
+    const std::shared_ptr<SimulatedInstrument> instrument_;
+    const std::uint64_t plugging_;  ///< of the instrument, when the connection was made
+};
+
+std::shared_ptr<Platform::Usb::UsbDevice> SimulatedInstrument::Connect(
+    std::shared_ptr<SimulatedInstrument> instrument) {
+    const std::lock_guard lock(instrument->mutex_);
+    return std::make_shared<Connection>(instrument, instrument->plugging_);
+}
+
+SimulatedInstrument::Connection::~Connection() {
+    Release();
+    instrument_->Do([this](std::uint64_t, Completions& done) {
+        for (Endpoint& endpoint : instrument_->endpoints_) {
+            std::erase_if(endpoint.queue, [&](const Pending& pending) {
+                if (pending.owner == this) {
+                    done.Add(*pending.transfer, TransferStatus::Cancelled, 0);
+                }
+                return pending.owner == this;
+            });
+        }
+    });
+    instrument_->WaitForClients();
+}
+
+ErrorCode SimulatedInstrument::Connection::Claim() {
+    SimulatedInstrument& instrument = *instrument_;
+    {
+        const std::lock_guard lock(instrument.mutex_);
+        if (!IsAttached()) {
+            return Errors::DeviceNotConnected;
+        }
+        if (instrument.claimedBy_) {
+            return Errors::Busy;
+        }
+        instrument.claimedBy_ = this;
+        instrument.configuration_ = ConfigurationValue;
+    }
+    if (const auto delay = instrument.settings_.buttonAfterMilliseconds) {
+        instrument.buttonAlarm_.RingNoLaterThan(instrument.scheduler_.Now() +
+                                                *delay * MicrosecondsPerMillisecond);
+    }
+    return Errors::Success;
+}
+
+void SimulatedInstrument::Connection::Release() {
+    {
+        const std::lock_guard lock(instrument_->mutex_);
+        if (instrument_->claimedBy_ != this) {
+            return;
+        }
+        instrument_->claimedBy_ = nullptr;
+    }
+    instrument_->buttonAlarm_.Clear();
+}
+
+ErrorCode SimulatedInstrument::Connection::Submit(Transfer& transfer) try {
     ErrorCode code = Errors::Success;
-    Do([&](std::uint64_t now, Completions& done) {
-        Endpoint* const endpoint = FindEndpoint(transfer.endpoint);
-        if (!Attached(attachment)) {
+    instrument_->Do([&](std::uint64_t now, Completions& done) {
+        Endpoint* const endpoint = instrument_->FindEndpoint(transfer.endpoint);
+        if (!IsAttached()) {
             code = Errors::DeviceNotConnected;
         } else if (transfer.endpoint == 0) {
-            Control(transfer, now, done);
+            instrument_->Control(transfer, now, done);
         } else if (!endpoint) {
             code = Errors::InvalidParameter;
         } else if (endpoint->halted) {
             done.Add(transfer, TransferStatus::Stalled, 0);
         } else {
-            endpoint->queue.push_back({&transfer, &attachment, now});
+            endpoint->queue.push_back({&transfer, this, now});
         }
     });
     return code;
@@ -135,47 +182,33 @@ ErrorCode SimulatedInstrument::Submit(const Attachment& attachment, Transfer& tr
     return Errors::NotEnoughMemory;
 }
 
-void SimulatedInstrument::Cancel(Transfer& transfer) {
-    Do([&](std::uint64_t now, Completions& done) {
-        for (Endpoint& endpoint : endpoints_) {
+void SimulatedInstrument::Connection::Cancel(Transfer& transfer) {
+    instrument_->Do([&](std::uint64_t now, Completions& done) {
+        for (Endpoint& endpoint : instrument_->endpoints_) {
             const auto pending = std::ranges::find(endpoint.queue, &transfer, &Pending::transfer);
             if (pending == endpoint.queue.end()) {
                 continue;
             }
-            const bool moves = &endpoint == &endpoints_[BulkIn] && pending == endpoint.queue.begin();
-            const std::uint32_t moved = moves ? TakeWhatMoved(*pending, now) : 0;
+            const bool moves =
+                &endpoint == &instrument_->endpoints_[BulkIn] && pending == endpoint.queue.begin();
+            const std::uint32_t moved = moves ? instrument_->TakeWhatMoved(*pending, now) : 0;
             endpoint.queue.erase(pending);
             done.Add(transfer, TransferStatus::Cancelled, moved);
         }
     });
 }
 
-ErrorCode SimulatedInstrument::ClearHalt(const Attachment& attachment, std::uint8_t address) {
-    const std::lock_guard lock(mutex_);
-    if (!Attached(attachment)) {
+ErrorCode SimulatedInstrument::Connection::ClearHalt(std::uint8_t address) {
+    const std::lock_guard lock(instrument_->mutex_);
+    if (!IsAttached()) {
         return Errors::DeviceNotConnected;
     }
-    Endpoint* const endpoint = FindEndpoint(address);
+    Endpoint* const endpoint = instrument_->FindEndpoint(address);
     if (!endpoint) {
         return Errors::InvalidParameter;
     }
     endpoint->halted = false;
     return Errors::Success;
-}
-
-void SimulatedInstrument::Drop(const Attachment& attachment) {
-    Release(attachment);
-    Do([&](std::uint64_t, Completions& done) {
-        for (Endpoint& endpoint : endpoints_) {
-            std::erase_if(endpoint.queue, [&](const Pending& pending) {
-                if (pending.owner == &attachment) {
-                    done.Add(*pending.transfer, TransferStatus::Cancelled, 0);
-                }
-                return pending.owner == &attachment;
-            });
-        }
-    });
-    WaitForClients();
 }
 
 void SimulatedInstrument::Unplug() {

@@ -57,13 +57,9 @@ class SimulatedInstrument final {
   private:
     class Connection;
 
-    /// Who opened the instrument, and in which of its times between two unpluggings.
-    struct Attachment {
-        std::uint64_t plugging = 0;
-    };
     struct Pending {
         Platform::Usb::Transfer* transfer;
-        const Attachment* owner;
+        const Connection* owner;
         std::uint64_t since;  // nanoseconds
     };
     struct Endpoint {
@@ -73,13 +69,6 @@ class SimulatedInstrument final {
 
     static constexpr std::uint64_t Never = ~std::uint64_t{0};
 
-    std::uint64_t Plugging() const;
-    Platform::ErrorCode Claim(const Attachment& attachment);
-    void Release(const Attachment& attachment);
-    Platform::ErrorCode Submit(const Attachment& attachment, Platform::Usb::Transfer& transfer);
-    void Cancel(Platform::Usb::Transfer& transfer);
-    Platform::ErrorCode ClearHalt(const Attachment& attachment, std::uint8_t endpoint);
-    void Drop(const Attachment& attachment);
     void WaitForClients() const;
     /// Calls `change` with the lock held, completes what can be completed then, and tells those concerned
     /// once the lock is free. It gets the time (nanoseconds of the scheduler's clock; 0 when no transfer
@@ -88,9 +77,6 @@ class SimulatedInstrument final {
     void Do(Change change);
 
     // Called with the lock held.
-    bool Attached(const Attachment& attachment) const {
-        return pluggedIn_ && attachment.plugging == plugging_;
-    }
     Endpoint* FindEndpoint(std::uint8_t address);
     void Control(Platform::Usb::Transfer& transfer, std::uint64_t now, Completions& done);
     bool StandardOut(const Platform::Usb::SetupPacket& setup, Completions& done);
@@ -113,8 +99,8 @@ class SimulatedInstrument final {
     mutable std::mutex mutex_;  // guards what follows; not held while a client or the scheduler is called
     Commands commands_;
     std::array<Endpoint, 3> endpoints_;  // as in the descriptors
-    const Attachment* claimedBy_ = nullptr;
-    std::uint64_t plugging_ = 1;
+    const Connection* claimedBy_ = nullptr;
+    std::uint64_t plugging_ = 1;  // counts the times between two unpluggings
     bool pluggedIn_ = true;
     std::uint8_t configuration_ = 0;
     bool buttonReportWaits_ = false;
