@@ -24,18 +24,6 @@ constexpr std::uint64_t CallsPerHandOver = 4;
     std::abort();
 }
 
-class WaitingForThreads final : public BlockedCall {
-  public:
-    using BlockedCall::BlockedCall;
-    std::string Describe() const override { return "the end of the other threads (the clock is to end)"; }
-};
-
-class Yielding final : public BlockedCall {
-  public:
-    using BlockedCall::BlockedCall;
-    std::string Describe() const override { return "its next time slice"; }
-};
-
 }  // namespace
 
 VirtualClock::VirtualClock(std::uint64_t seed)
@@ -48,7 +36,7 @@ VirtualClock::VirtualClock(std::uint64_t seed)
 VirtualClock::~VirtualClock() {
     ScheduledEvents dropped;
     DispatcherLock hold;
-    WaitingForThreads call(installer_);
+    BlockedCall call(installer_, "the end of the other threads (the clock is to end)");
     awaitingRest_ = &call;
     while (!IsAtRest() && !call.hopeless) {
         call.woken = false;
@@ -184,7 +172,7 @@ void VirtualClock::GiveUpSlice(DispatcherLock& hold) {
         AwaitTurn(hold, self);
         HandOver(hold, self);
     } else {
-        Yielding call(self);
+        BlockedCall call(self, "its next time slice");
         Block(hold, call, now_ + 1);
     }
 }

@@ -8,16 +8,6 @@ namespace Varnholt::Simulator {
 using namespace Platform;
 using namespace Platform::Linux;
 
-namespace {
-
-class WaitingForEvent final : public BlockedCall {
-  public:
-    using BlockedCall::BlockedCall;
-    std::string Describe() const override { return "the end of an event that is to be forgotten"; }
-};
-
-}  // namespace
-
 void VirtualClock::CallAt(std::uint64_t time, std::function<void()> event, const void* owner) {
     const DispatcherLock hold;
     if (!eventThread_.joinable()) {
@@ -38,7 +28,7 @@ void VirtualClock::Forget(const void* owner) {
     DropEventsOf(owner, dropped);
     while (isCalling_ && ownerOfCall_ == owner && &self != &eventRecord_) {
         if (self.state == State::Running) {
-            WaitingForEvent call(self);
+            BlockedCall call(self, "the end of an event that is to be forgotten");
             forgetting_.push_back(&call);
             Block(hold, call, Never);
             std::erase(forgetting_, &call);

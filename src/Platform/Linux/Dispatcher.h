@@ -59,7 +59,8 @@ void AbandonOwned(ThreadRecord& thread);
 /// A stay inside a call that blocks; lives on the stack of the thread that makes the call.
 class BlockedCall {
   public:
-    explicit BlockedCall(ThreadRecord& caller) : thread(caller) {}
+    BlockedCall(ThreadRecord& caller, const char* waitedFor) : thread(caller), what_(waitedFor) {}
+    virtual ~BlockedCall() = default;
     BlockedCall(const BlockedCall&) = delete;
     BlockedCall& operator=(const BlockedCall&) = delete;
 
@@ -70,10 +71,10 @@ class BlockedCall {
     bool handlesEvents = false;
 
     /// For the report of a deadlock: what is waited for.
-    virtual std::string Describe() const = 0;
+    virtual std::string Describe() const { return what_; }
 
-  protected:
-    ~BlockedCall() = default;
+  private:
+    const char* const what_;
 };
 
 }  // namespace Varnholt::Platform::Linux

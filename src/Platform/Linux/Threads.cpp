@@ -40,12 +40,6 @@ void* RunThread(void* argument) {
     return nullptr;
 }
 
-class Sleeping final : public BlockedCall {
-  public:
-    using BlockedCall::BlockedCall;
-    std::string Describe() const override { return "the end of a sleep"; }
-};
-
 /// A thread's nice value is its own on Linux.
 constexpr int NicePerLevel = 5;
 
@@ -129,7 +123,7 @@ void SleepMilliseconds(std::uint32_t milliseconds) {
         CurrentClock().GiveUpSlice(hold);
         return;
     }
-    Sleeping call(CurrentThread());
+    BlockedCall call(CurrentThread(), "the end of a sleep");
     CurrentClock().Block(hold, call, DeadlineAfter(milliseconds));
 }
 

@@ -16,7 +16,8 @@ constexpr Microseconds LongestLook = 4000;
 /// One wait, entered with each of its objects.
 class Waiter final : public BlockedCall {
   public:
-    Waiter(ThreadRecord& caller, std::span<WaitEntry> waitedFor) : BlockedCall(caller), entries_(waitedFor) {
+    Waiter(ThreadRecord& caller, std::span<WaitEntry> waitedFor)
+        : BlockedCall(caller, ""), entries_(waitedFor) {
         for (WaitEntry& entry : entries_) {
             entry.waiter = this;
             entry.object->Enqueue(entry);
@@ -25,7 +26,7 @@ class Waiter final : public BlockedCall {
             source = entries_[0].object->SignalledBy();
         }
     }
-    ~Waiter() {
+    ~Waiter() override {
         for (WaitEntry& entry : entries_) {
             entry.object->Dequeue(entry);
         }
