@@ -224,6 +224,7 @@ void SimulatedInstrument::Unplug() {
             EndAll(endpoint, TransferStatus::DeviceGone, done);
         }
     });
+    dataAlarm_.Clear();  // the clock may be another when the next data are waited for
 }
 
 void SimulatedInstrument::PlugIn() {

@@ -146,6 +146,32 @@ TEST_F(SimulatedInstrumentTest, UnplugLosesWhatIsVolatile) {
     });
 }
 
+/// A clock that stands still and whose events nobody hears of.
+class StoppedScheduler final : public Platform::EventScheduler {
+  public:
+    std::uint64_t Now() override { return 0; }
+    void CallAt(std::uint64_t, std::function<void()>, const void*) override { ++events; }
+    void Forget(const void*) override {}
+
+    int events = 0;
+};
+
+TEST(SimulatedConnectionTest, WhatWasDueBeforeAnUnpluggingIsNotWaitedForAfterwards) {
+    StoppedScheduler scheduler;
+    const auto instrument =
+        std::make_shared<SimulatedInstrument>(scheduler, InstrumentSettings{.takesIntegrationTime = true});
+    for (const int expected : {1, 2}) {
+        TestTransfer measure = TestTransfer::Vendor(Request::Measure);
+        TestTransfer readout = TestTransfer::In(BulkInEndpoint, 256);
+        const auto connection = SimulatedInstrument::Connect(instrument);
+        connection->Submit(measure);
+        connection->Submit(readout);
+        EXPECT_EQ(expected, scheduler.events);
+        instrument->Unplug();
+        instrument->PlugIn();
+    }
+}
+
 TEST(SimulatedConnectionTest, EachOpeningHasItsOwnClaimAndTransfers) {
     const auto instrument = std::make_shared<SimulatedInstrument>(Platform::ClockScheduler());
     const auto other = SimulatedInstrument::Connect(instrument);
