@@ -3,16 +3,9 @@
 #include <poll.h>
 
 #include <algorithm>
-#include <chrono>
 #include <vector>
 
 namespace Varnholt::Simulator {
-
-std::uint64_t PollLoop::Now() {
-    const auto sinceStart = std::chrono::steady_clock::now().time_since_epoch();
-    return static_cast<std::uint64_t>(
-        std::chrono::duration_cast<std::chrono::microseconds>(sinceStart).count());
-}
 
 void PollLoop::CallAt(std::uint64_t time, std::function<void()> event, const void* owner) {
     waiting_.emplace(time, Platform::ScheduledEvent{std::move(event), owner});

@@ -14,7 +14,7 @@ namespace Varnholt::Simulator {
 /// used from that thread only.
 class PollLoop : public Platform::EventScheduler {
   public:
-    std::uint64_t Now() override;
+    std::uint64_t Now() override { return Platform::SteadyMicroseconds(); }
     void CallAt(std::uint64_t time, std::function<void()> event, const void* owner = nullptr) override;
     void Forget(const void* owner) override;
     /// As soon as what is being called now has returned.

@@ -25,6 +25,9 @@ class EventScheduler {
 /// runs only while events are waiting.
 EventScheduler& ClockScheduler();
 
+/// For schedulers: microseconds of the system's own clock.
+std::uint64_t SteadyMicroseconds();
+
 /// For schedulers: the events that wait, by their time.
 struct ScheduledEvent {
     std::function<void()> call;

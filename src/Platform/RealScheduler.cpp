@@ -31,7 +31,7 @@ RealScheduler::~RealScheduler() {
     WaitForEnd(hold);
 }
 
-std::uint64_t RealScheduler::Now() {
+std::uint64_t SteadyMicroseconds() {
     const auto sinceStart = steady_clock::now().time_since_epoch();
     return static_cast<std::uint64_t>(std::chrono::floor<microseconds>(sinceStart).count());
 }
@@ -73,7 +73,7 @@ void RealScheduler::Forget(const void* owner) {
 void RealScheduler::CallEvents() {
     Hold hold(lock_);
     while (!events_.empty()) {
-        const std::uint64_t now = Now();
+        const std::uint64_t now = SteadyMicroseconds();
         const std::uint64_t time = events_.begin()->first;
         if (time > now) {
             // A time so far off that the system's clock could not hold it is approached in steps.

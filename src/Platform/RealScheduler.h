@@ -21,7 +21,7 @@ class RealScheduler final : public EventScheduler {
     RealScheduler(const RealScheduler&) = delete;
     RealScheduler& operator=(const RealScheduler&) = delete;
 
-    std::uint64_t Now() override;
+    std::uint64_t Now() override { return SteadyMicroseconds(); }
     void CallAt(std::uint64_t time, std::function<void()> event, const void* owner) override;
     void Forget(const void* owner) override;
 

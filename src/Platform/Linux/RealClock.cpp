@@ -50,10 +50,7 @@ class RealClock final : public Clock {
   public:
     bool IsCooperative() const override { return false; }
 
-    Microseconds Now() override {
-        const auto sinceStart = steady_clock::now().time_since_epoch();
-        return static_cast<Microseconds>(std::chrono::floor<std::chrono::microseconds>(sinceStart).count());
-    }
+    Microseconds Now() override { return SteadyMicroseconds(); }
 
     WallTime Wall() override {
         const auto now = std::chrono::floor<std::chrono::milliseconds>(std::chrono::system_clock::now());
