@@ -9,11 +9,10 @@
 namespace Varnholt::Simulator {
 
 EepromFile::EepromFile(PollLoop& pollLoop, std::string name, Log logger)
-    : loop_(pollLoop), fileName_(std::move(name)), log_(std::move(logger)) {}
-
-EepromFile::~EepromFile() {
-    loop_.Forget(this);
-}
+    : loop_(pollLoop),
+      fileName_(std::move(name)),
+      log_(std::move(logger)),
+      saving_(loop_, [this] { Save(); }) {}
 
 bool EepromFile::Exists() const {
     std::error_code error;
@@ -32,22 +31,18 @@ void EepromFile::MemoryChanged() {
     // An image comes in many pieces.
     constexpr std::uint64_t delay = 100'000;
     unsaved_ = true;
-    if (!std::exchange(savesSoon_, true)) {
-        loop_.CallAt(
-            loop_.Now() + delay, [this] { Save(); }, this);
-    }
+    saving_.RingNoLaterThan(loop_.Now() + delay);
 }
 
 bool EepromFile::Finish() {
     if (unsaved_ && instrument_) {
-        loop_.Forget(this);
+        saving_.Clear();
         Save();
     }
     return !unsaved_;
 }
 
 void EepromFile::Save() {
-    savesSoon_ = false;
     try {
         Utilities::Files::WriteFileAtomically(fileName_, instrument_->Eeprom());
         unsaved_ = false;

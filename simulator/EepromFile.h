@@ -3,6 +3,7 @@
 #include <memory>
 #include <string>
 
+#include "Alarm.h"
 #include "PollLoop.h"
 #include "SimulatedInstrument.h"
 #include "TransferLog.h"
@@ -15,7 +16,6 @@ class EepromFile final {
   public:
     /// `pollLoop` must outlive it. `logger` is told when the file cannot be written.
     EepromFile(PollLoop& pollLoop, std::string name, Log logger);
-    ~EepromFile();
     EepromFile(const EepromFile&) = delete;
     EepromFile& operator=(const EepromFile&) = delete;
 
@@ -35,8 +35,8 @@ class EepromFile final {
     const std::string fileName_;
     const Log log_;
     std::shared_ptr<SimulatedInstrument> instrument_;
-    bool savesSoon_ = false;
     bool unsaved_ = false;
+    Alarm saving_;
 };
 
 }  // namespace Varnholt::Simulator

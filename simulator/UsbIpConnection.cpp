@@ -25,6 +25,8 @@ UsbIpConnection::UsbIpConnection(PollLoop& pollLoop, Platform::Linux::FileDescri
       file_(std::move(connectedSocket)),
       exports_(std::move(offered)),
       over_(std::move(whenOver)),
+      peerCheck_(loop_, [this] { CheckPeer(); }),
+      flushing_(loop_, [this] { Flush(); }),
       session_(imported ? UsbIpSession(std::move(imported), [this] { FlushSoon(); })
                         : UsbIpSession(*exports_, [this] { FlushSoon(); })) {
     Watch();
@@ -42,36 +44,26 @@ void UsbIpConnection::Watch() {
         watchedFor_ = events;
         loop_.Watch(file_.Get(), events, [this] { Ready(); });
     }
-    if (!checksPeer_ && session_.PeerIsDue()) {
-        CheckPeerAt(loop_.Now() + Patience);
+    if (session_.PeerIsDue()) {
+        peerCheck_.RingNoLaterThan(loop_.Now() + Patience);
     }
 }
 
-void UsbIpConnection::CheckPeerAt(std::uint64_t time) {
-    checksPeer_ = true;
-    const auto check = [this] {
-        checksPeer_ = false;
-        if (!session_.PeerIsDue()) {
-            return;
-        }
-        if (lastMoved_ + Patience > loop_.Now()) {
-            CheckPeerAt(lastMoved_ + Patience);
-            return;
-        }
-        End("silent for too long");
-    };
-    loop_.CallAt(time, check, this);
+void UsbIpConnection::CheckPeer() {
+    if (!session_.PeerIsDue()) {
+        return;
+    }
+    if (lastMoved_ + Patience > loop_.Now()) {
+        peerCheck_.RingNoLaterThan(lastMoved_ + Patience);
+        return;
+    }
+    End("silent for too long");
 }
 
 /// Not from inside the session, which is busy.
 void UsbIpConnection::FlushSoon() {
-    if (!flushesSoon_ && !ended_) {
-        flushesSoon_ = true;
-        const auto flush = [this] {
-            flushesSoon_ = false;
-            Flush();
-        };
-        loop_.CallSoon(flush, this);
+    if (!ended_) {
+        flushing_.RingNoLaterThan(0);
     }
 }
 
@@ -121,7 +113,8 @@ bool UsbIpConnection::SendOutput() {
 
 void UsbIpConnection::StopListening() {
     ended_ = true;
-    loop_.Forget(this);
+    peerCheck_.Clear();
+    flushing_.Clear();
     loop_.Unwatch(file_.Get());
 }
 

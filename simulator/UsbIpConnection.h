@@ -7,6 +7,7 @@
 #include <memory>
 #include <string>
 
+#include "Alarm.h"
 #include "Platform/Linux/FileDescriptor.h"
 #include "PollLoop.h"
 #include "UsbIpSession.h"
@@ -31,7 +32,7 @@ class UsbIpConnection final {
 
   private:
     void Watch();
-    void CheckPeerAt(std::uint64_t time);
+    void CheckPeer();
     void FlushSoon();
     void Ready();
     void Flush();
@@ -48,11 +49,11 @@ class UsbIpConnection final {
     std::array<std::uint8_t, 65536> input_{};
     std::size_t inputStart_ = 0;
     std::size_t inputEnd_ = 0;
-    bool flushesSoon_ = false;
-    bool checksPeer_ = false;
     std::uint64_t lastMoved_ = 0;  // when bytes went either way
     short watchedFor_ = -1;
     bool ended_ = false;
+    Alarm peerCheck_;
+    Alarm flushing_;
     UsbIpSession session_;  ///< ends first
 };
 
