@@ -10,12 +10,13 @@
 #include <mutex>
 #include <new>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include "Platform/Linux/ErrnoCodes.h"
 #include "Platform/Linux/FileDescriptor.h"
 #include "Platform/Linux/HostSignalsBlocked.h"
-#include "Platform/Usb/LibUsbErrors.h"
+#include "Platform/LookUp.h"
 #include "Platform/Usb/LibUsbEvents.h"
 #include "Platform/Usb/ReleasedBy.h"
 #include "Protocol/Instrument.h"
@@ -28,6 +29,38 @@ constexpr int ConfigurationValue = 1;
 /// A device that has just been plugged in can be opened before the kernel has configured it.
 constexpr auto ClaimPatience = std::chrono::milliseconds(2000);
 constexpr auto ClaimRetryPause = std::chrono::milliseconds(20);
+
+/// All others are `Errors::GeneralFailure`: LIBUSB_ERROR_IO, _PIPE, _OVERFLOW, _OTHER.
+constexpr std::pair<int, ErrorCode> Codes[] = {
+    {LIBUSB_SUCCESS, Errors::Success},
+    {LIBUSB_ERROR_ACCESS, Errors::AccessDenied},
+    {LIBUSB_ERROR_NO_DEVICE, Errors::DeviceNotConnected},
+    {LIBUSB_ERROR_NOT_FOUND, Errors::FileNotFound},
+    {LIBUSB_ERROR_BUSY, Errors::Busy},
+    {LIBUSB_ERROR_TIMEOUT, Errors::SemaphoreTimeout},
+    {LIBUSB_ERROR_INVALID_PARAM, Errors::InvalidParameter},
+    {LIBUSB_ERROR_NO_MEM, Errors::NotEnoughMemory},
+    {LIBUSB_ERROR_NOT_SUPPORTED, Errors::NotSupported},
+    {LIBUSB_ERROR_INTERRUPTED, Errors::OperationAborted},
+};
+
+/// All others are `TransferStatus::IoError`.
+constexpr std::pair<int, TransferStatus> Statuses[] = {
+    {LIBUSB_TRANSFER_COMPLETED, TransferStatus::Completed},
+    {LIBUSB_TRANSFER_STALL, TransferStatus::Stalled},
+    {LIBUSB_TRANSFER_OVERFLOW, TransferStatus::Overflow},
+    {LIBUSB_TRANSFER_NO_DEVICE, TransferStatus::DeviceGone},
+    {LIBUSB_TRANSFER_CANCELLED, TransferStatus::Cancelled},
+    {LIBUSB_TRANSFER_TIMED_OUT, TransferStatus::Cancelled},
+};
+
+ErrorCode ErrorFromLibUsb(int libusbError) {
+    return LookUp(Codes, libusbError, Errors::GeneralFailure);
+}
+
+TransferStatus StatusFromLibUsb(int libusbTransferStatus) {
+    return LookUp(Statuses, libusbTransferStatus, TransferStatus::IoError);
+}
 
 /// What a transfer needs while it is under way: libusb's record, and for control transfers the buffer with
 /// the setup bytes in front. Used again and again.
