@@ -1,17 +1,16 @@
 #include "KernelStatus.h"
 
 #include <cstdint>
+#include <utility>
+
+#include "Platform/LookUp.h"
 
 namespace Varnholt::Simulator {
 
 namespace Errors = Platform::Errors;
 
 Status KernelStatus(Platform::ErrorCode code) {
-    struct Row {
-        Platform::ErrorCode code;
-        std::uint32_t status;
-    };
-    static constexpr Row rows[] = {
+    static constexpr std::pair<Platform::ErrorCode, std::uint32_t> statuses[] = {
         {Errors::Success, 0},
         {Errors::InvalidFunction, 0xC0000010},     // STATUS_INVALID_DEVICE_REQUEST
         {Errors::FileNotFound, 0xC0000034},        // STATUS_OBJECT_NAME_NOT_FOUND
@@ -26,16 +25,12 @@ Status KernelStatus(Platform::ErrorCode code) {
         {Errors::DeviceNotConnected, 0xC000009D},  // STATUS_DEVICE_NOT_CONNECTED
         {Errors::NoSystemResources, 0xC000009A},   // STATUS_INSUFFICIENT_RESOURCES
     };
-    for (const Row& row : rows) {
-        if (row.code == code) {
-            return static_cast<Status>(row.status);
-        }
-    }
     // The codes of the USBIO driver are marked as an application's own and pass as they are; of the others,
     // the kernel has a range that stands for the system's error codes.
     constexpr std::uint32_t ApplicationMark = 0x20000000;
     constexpr std::uint32_t SystemErrorRange = 0xC0010000;
-    return static_cast<Status>((code & ApplicationMark) != 0 ? code : SystemErrorRange | (code & 0xFFFF));
+    const std::uint32_t others = (code & ApplicationMark) != 0 ? code : SystemErrorRange | (code & 0xFFFF);
+    return static_cast<Status>(Platform::LookUp(statuses, code, others));
 }
 
 }  // namespace Varnholt::Simulator

@@ -18,6 +18,7 @@ struct StandInFile {
 namespace {
 
 namespace Errors = Varnholt::Platform::Errors;
+using Varnholt::Platform::Operation;
 using Varnholt::Simulator::KernelStatus;
 
 /// Nothing is thrown into the driver.
@@ -32,9 +33,8 @@ Status Guarded(Function function) noexcept {
     }
 }
 
-template <class Byte, class Pointer>
-std::span<Byte> Bytes(Pointer* pointer, unsigned long length) {
-    return {static_cast<Byte*>(pointer), pointer != nullptr ? length : 0};
+std::uint32_t Size(const void* buffer, unsigned long length) {
+    return static_cast<std::uint32_t>(buffer != nullptr ? length : 0);
 }
 
 }  // namespace
@@ -64,8 +64,10 @@ Status StandInOpen(StandInInstrument* instrument, int usbIo, unsigned long pipe,
         if (!driver) {
             return KernelStatus(error);
         }
-        *file = new StandInFile{
-            std::make_shared<Varnholt::Simulator::StandInFileObject>(instrument->object, std::move(driver))};
+        const auto opened =
+            std::make_shared<Varnholt::Simulator::StandInFileObject>(instrument->object, std::move(driver));
+        instrument->object->Add(opened);
+        *file = new StandInFile{opened};
         return KernelStatus(Errors::Success);
     });
 }
@@ -78,7 +80,9 @@ void StandInClose(StandInFile* file) {
 Status StandInTransfer(StandInFile* file, int reads, void* buffer, unsigned long length,
                        StandInRequest request, unsigned long* bytes) {
     return Guarded([&] {
-        return file->object->Transfer(reads != 0, Bytes<std::uint8_t>(buffer, length), request, *bytes);
+        const std::uint32_t size = Size(buffer, length);
+        return file->object->Start(
+            reads != 0 ? Operation::Read(buffer, size) : Operation::Write(buffer, size), request, *bytes);
     });
 }
 
@@ -86,9 +90,10 @@ Status StandInControl(StandInFile* file, unsigned long code, const void* input, 
                       void* output, unsigned long outputLength, StandInRequest request,
                       unsigned long* bytes) {
     return Guarded([&] {
-        return file->object->Control(static_cast<std::uint32_t>(code),
-                                     Bytes<const std::uint8_t>(input, inputLength),
-                                     Bytes<std::uint8_t>(output, outputLength), request, *bytes);
+        const std::span block(static_cast<const std::uint8_t*>(input), Size(input, inputLength));
+        return file->object->Start(
+            Operation::Control(static_cast<std::uint32_t>(code), block, output, Size(output, outputLength)),
+            request, *bytes);
     });
 }
 

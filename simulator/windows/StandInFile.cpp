@@ -13,6 +13,7 @@
 
 namespace Varnholt::Simulator {
 
+using Platform::Operation;
 using Platform::Drivers::Decision;
 
 /// A request on its way. Kept alive by the file while it runs, and by whoever cancels it.
@@ -40,39 +41,17 @@ class StandInFileObject::Running final : public Platform::Usb::TransferClient {
     const StandInRequest request;
 };
 
-StandInFileObject::StandInFileObject(std::shared_ptr<StandInInstrumentObject> opened,
-                                     std::unique_ptr<Platform::Drivers::DriverFile> file)
-    : instrument_(std::move(opened)), driver_(std::move(file)) {
-    instrument_->Add(*this);
-}
-
-StandInFileObject::~StandInFileObject() {
-    instrument_->Remove(*this);
-}
-
-Status StandInFileObject::Transfer(bool reads, std::span<std::uint8_t> buffer, const StandInRequest& request,
-                                   unsigned long& bytes) {
-    const auto running = std::make_shared<Running>(shared_from_this(), request);
-    running->transfer.data = buffer.data();
-    running->transfer.length = static_cast<std::uint32_t>(buffer.size());
-    return Start(driver_->Move(reads, running->transfer), running, bytes);
-}
-
-Status StandInFileObject::Control(std::uint32_t code, std::span<const std::uint8_t> input,
-                                  std::span<std::uint8_t> output, const StandInRequest& request,
-                                  unsigned long& bytes) {
-    if (const auto status = TestControl(code, input, output, bytes)) {
+Status StandInFileObject::Start(const Operation& operation, const StandInRequest& request,
+                                unsigned long& bytes) {
+    if (const auto status = TestControl(operation, bytes)) {
         return *status;
     }
-    // With the buffered method, input and output are one buffer.
-    const std::vector<std::uint8_t> copiedInput(input.begin(), input.end());
+    // With the buffered method, a control's input and output are one buffer.
+    const std::vector<std::uint8_t> copiedInput(operation.input.begin(), operation.input.end());
+    Operation copied = operation;
+    copied.input = copiedInput;
     const auto running = std::make_shared<Running>(shared_from_this(), request);
-    const Decision decision = driver_->Control(code, copiedInput, output, running->transfer);
-    return Start(decision, running, bytes);
-}
-
-Status StandInFileObject::Start(const Decision& decision, const std::shared_ptr<Running>& running,
-                                unsigned long& bytes) {
+    const Decision decision = driver_->Decide(copied, running->transfer);
     bytes = decision.bytes;
     if (decision.kind != Decision::Kind::Send) {
         return KernelStatus(decision.code);
@@ -81,7 +60,7 @@ Status StandInFileObject::Start(const Decision& decision, const std::shared_ptr<
         const std::lock_guard held(lock_);
         requests_.emplace(running->request.number, running);
     }
-    LimitTime(*running);
+    LimitTime(running);
     running->request.pending(running->request.packet);
     const Platform::ErrorCode refusal = driver_->Device().Submit(running->transfer);
     if (refusal != Platform::Errors::Success) {
@@ -91,18 +70,16 @@ Status StandInFileObject::Start(const Decision& decision, const std::shared_ptr<
     return StatusPending;
 }
 
-void StandInFileObject::LimitTime(const Running& running) {
-    const std::uint32_t limit = driver_->TimeLimitOf(running.transfer);
+void StandInFileObject::LimitTime(const std::shared_ptr<Running>& running) {
+    const std::uint32_t limit = driver_->TimeLimitOf(running->transfer);
     if (limit == 0) {
         return;
     }
     auto& scheduler = Platform::ClockScheduler();
-    const auto giveUp = [file = weak_from_this(), number = running.request.number] {
-        if (const auto living = file.lock()) {
-            living->CancelThose([number](unsigned long candidate, Running& found) {
-                found.givenUp = found.givenUp || candidate == number;
-                return candidate == number;
-            });
+    const auto giveUp = [given = std::weak_ptr(running)] {
+        if (const auto late = given.lock()) {
+            late->givenUp = true;
+            late->file->driver_->Device().Cancel(late->transfer);
         }
     };
     scheduler.CallAt(scheduler.Now() + std::uint64_t{limit} * 1000, giveUp);
@@ -125,7 +102,7 @@ void StandInFileObject::CancelThose(Matches matches) {
     {
         const std::lock_guard held(lock_);
         for (const auto& [number, running] : requests_) {
-            if (matches(number, *running)) {
+            if (matches(*running)) {
                 found.push_back(running);
             }
         }
@@ -136,27 +113,26 @@ void StandInFileObject::CancelThose(Matches matches) {
 }
 
 void StandInFileObject::Cancel(unsigned long requestNumber) {
-    CancelThose([requestNumber](unsigned long number, const Running&) { return number == requestNumber; });
+    CancelThose([requestNumber](const Running& running) { return running.request.number == requestNumber; });
 }
 
 void StandInFileObject::CancelEndpoint(std::uint8_t endpoint) {
-    CancelThose(
-        [endpoint](unsigned long, const Running& running) { return running.transfer.endpoint == endpoint; });
+    CancelThose([endpoint](const Running& running) { return running.transfer.endpoint == endpoint; });
 }
 
 void StandInFileObject::CancelAll() {
-    CancelThose([](unsigned long, const Running&) { return true; });
+    CancelThose([](const Running&) { return true; });
 }
 
-std::optional<Status> StandInFileObject::TestControl(std::uint32_t code, std::span<const std::uint8_t> input,
-                                                     std::span<std::uint8_t> output, unsigned long& bytes) {
+std::optional<Status> StandInFileObject::TestControl(const Operation& operation, unsigned long& bytes) {
     SimulatedInstrument& simulated = instrument_->Simulated();
+    const auto& input = operation.input;
     const auto answer = [&](const void* data, std::size_t size) {
-        bytes = static_cast<unsigned long>(std::min(size, output.size()));
-        std::memcpy(output.data(), data, bytes);
+        bytes = static_cast<unsigned long>(std::min<std::size_t>(size, operation.length));
+        std::memcpy(operation.data, data, bytes);
     };
     bytes = 0;
-    switch (code) {
+    switch (operation.code) {
         case TestControls::PressButton:
             simulated.PressButton();
             break;

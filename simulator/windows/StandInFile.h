@@ -4,7 +4,7 @@
 #include <memory>
 #include <mutex>
 #include <optional>
-#include <span>
+#include <utility>
 
 #include "Platform/Drivers/DriverFile.h"
 #include "Platform/Usb/UsbDevice.h"
@@ -18,15 +18,12 @@ namespace Varnholt::Simulator {
 class StandInFileObject final : public std::enable_shared_from_this<StandInFileObject> {
   public:
     StandInFileObject(std::shared_ptr<StandInInstrumentObject> opened,
-                      std::unique_ptr<Platform::Drivers::DriverFile> file);
-    ~StandInFileObject();
+                      std::unique_ptr<Platform::Drivers::DriverFile> file)
+        : instrument_(std::move(opened)), driver_(std::move(file)) {}
     StandInFileObject(const StandInFileObject&) = delete;
     StandInFileObject& operator=(const StandInFileObject&) = delete;
 
-    Status Transfer(bool reads, std::span<std::uint8_t> buffer, const StandInRequest& request,
-                    unsigned long& bytes);
-    Status Control(std::uint32_t code, std::span<const std::uint8_t> input, std::span<std::uint8_t> output,
-                   const StandInRequest& request, unsigned long& bytes);
+    Status Start(const Platform::Operation& operation, const StandInRequest& request, unsigned long& bytes);
 
     void Cancel(unsigned long requestNumber);
     void CancelEndpoint(std::uint8_t endpoint);
@@ -35,12 +32,9 @@ class StandInFileObject final : public std::enable_shared_from_this<StandInFileO
   private:
     class Running;
 
-    Status Start(const Platform::Drivers::Decision& decision, const std::shared_ptr<Running>& running,
-                 unsigned long& bytes);
-    void LimitTime(const Running& running);
+    void LimitTime(const std::shared_ptr<Running>& running);
     void Ended(Running& running, Status status);
-    std::optional<Status> TestControl(std::uint32_t code, std::span<const std::uint8_t> input,
-                                      std::span<std::uint8_t> output, unsigned long& bytes);
+    std::optional<Status> TestControl(const Platform::Operation& operation, unsigned long& bytes);
     template <class Matches>
     void CancelThose(Matches matches);
 

@@ -89,26 +89,17 @@ std::unique_ptr<Drivers::DriverFile> StandInInstrumentObject::Open(bool usbIo, s
     return std::make_unique<Drivers::UsbIoDriverFile>(std::move(opened));
 }
 
-void StandInInstrumentObject::Add(StandInFileObject& file) {
+void StandInInstrumentObject::Add(const std::shared_ptr<StandInFileObject>& file) {
     const std::lock_guard held(lock_);
-    files_.insert(&file);
-}
-
-void StandInInstrumentObject::Remove(StandInFileObject& file) {
-    const std::lock_guard held(lock_);
-    files_.erase(&file);
-}
-
-std::size_t StandInInstrumentObject::OpenFiles() {
-    const std::lock_guard held(lock_);
-    return files_.size();
+    std::erase_if(files_, [](const auto& closed) { return closed.expired(); });
+    files_.push_back(file);
 }
 
 std::vector<std::shared_ptr<StandInFileObject>> StandInInstrumentObject::Files() {
     std::vector<std::shared_ptr<StandInFileObject>> open;
     const std::lock_guard held(lock_);
-    for (StandInFileObject* file : files_) {
-        if (auto living = file->weak_from_this().lock()) {
+    for (const auto& file : files_) {
+        if (auto living = file.lock()) {
             open.push_back(std::move(living));
         }
     }

@@ -3,7 +3,6 @@
 #include <atomic>
 #include <memory>
 #include <mutex>
-#include <set>
 #include <string>
 #include <vector>
 
@@ -29,9 +28,8 @@ class StandInInstrumentObject final {
     /// What the driver makes of an opening; null with the code in `error`.
     std::unique_ptr<Platform::Drivers::DriverFile> Open(bool usbIo, std::uint32_t pipe,
                                                         Platform::ErrorCode& error);
-    void Add(StandInFileObject& file);
-    void Remove(StandInFileObject& file);
-    std::size_t OpenFiles();
+    void Add(const std::shared_ptr<StandInFileObject>& file);
+    std::size_t OpenFiles() { return Files().size(); }
 
     SimulatedInstrument& Simulated();
     void SetFaults(const std::string& plan);
@@ -47,7 +45,7 @@ class StandInInstrumentObject final {
     std::atomic<bool> unplugged_ = false;
     std::atomic<bool> usedElsewhere_ = false;
     std::mutex lock_;  // guards what follows
-    std::set<StandInFileObject*> files_;
+    std::vector<std::weak_ptr<StandInFileObject>> files_;
     std::weak_ptr<Platform::Drivers::SharedDevice> device_;
     std::weak_ptr<Platform::Drivers::UsbIoDevice> usbIoDevice_;
     std::shared_ptr<Platform::Usb::UsbDevice> otherUser_;

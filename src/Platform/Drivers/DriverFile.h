@@ -2,9 +2,11 @@
 
 #include <cstdint>
 #include <memory>
+#include <new>
 #include <span>
 #include <utility>
 
+#include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/SharedDevice.h"
 #include "Platform/ErrorCodes.h"
 #include "Platform/Usb/UsbDevice.h"
@@ -37,6 +39,21 @@ class DriverFile {
     DriverFile(const DriverFile&) = delete;
     DriverFile& operator=(const DriverFile&) = delete;
 
+    /// Decides on an operation, by one of the next two.
+    Decision Decide(const Operation& operation, Usb::Transfer& transfer) {
+        transfer.data = operation.data;
+        transfer.length = operation.length;
+        if (operation.kind != Operation::Kind::Control) {
+            return Move(operation.kind == Operation::Kind::Read, transfer);
+        }
+        try {
+            return Control(operation.code, operation.input, {operation.data, operation.length}, transfer);
+        } catch (const std::bad_alloc&) {
+            return Decision::Refuse(RefusalOf(Errors::NotEnoughMemory));
+        } catch (...) {
+            return Decision::Refuse(RefusalOf(Errors::GeneralFailure));
+        }
+    }
     /// Decides on a read (`in`) or write; buffer and length stand in `transfer`, which gets its endpoint. A
     /// read of no bytes completes at once and reaches no endpoint; a write of no bytes is sent as an empty
     /// packet. On the path of every transfer: must not block.

@@ -8,24 +8,6 @@
 #include "Platform/EventScheduler.h"
 
 namespace Varnholt::Platform::Drivers {
-namespace {
-
-Decision Decide(DriverFile& driver, const Operation& operation, Usb::Transfer& transfer) {
-    transfer.data = operation.data;
-    transfer.length = operation.length;
-    if (operation.kind != Operation::Kind::Control) {
-        return driver.Move(operation.kind == Operation::Kind::Read, transfer);
-    }
-    try {
-        return driver.Control(operation.code, operation.input, {operation.data, operation.length}, transfer);
-    } catch (const std::bad_alloc&) {
-        return Decision::Refuse(driver.RefusalOf(Errors::NotEnoughMemory));
-    } catch (...) {
-        return Decision::Refuse(driver.RefusalOf(Errors::GeneralFailure));
-    }
-}
-
-}  // namespace
 
 void RunningRequest::TransferCompleted(Usb::Transfer&) noexcept {
     if ((state.fetch_or(Completed, std::memory_order_acq_rel) & Submitted) != 0) {
@@ -71,7 +53,7 @@ bool OpenFile::Start(const Operation& operation, Overlapped& record) {
     if (!request) {
         return RefuseStart(record, error);
     }
-    const Decision decision = Decide(*driver_, operation, request->transfer);
+    const Decision decision = driver_->Decide(operation, request->transfer);
     if (decision.kind == Decision::Kind::Refused) {
         Retire(*request);
         return RefuseStart(record, decision.code);
