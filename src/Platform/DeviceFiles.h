@@ -1,10 +1,8 @@
 #pragma once
 
-#include <cstddef>
 #include <cstdint>
 #include <span>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "Platform/DeviceInterfaces.h"
@@ -38,12 +36,6 @@ struct Operation {
     static Operation Control(std::uint32_t controlCode, std::span<const std::uint8_t> block, void* output,
                              std::uint32_t outputSize) {
         return {Kind::Control, static_cast<std::uint8_t*>(output), outputSize, controlCode, block};
-    }
-
-    /// For a call filter.
-    std::string_view CallName() const {
-        static constexpr std::string_view names[] = {"StartRead", "StartWrite", "StartControl"};
-        return names[static_cast<std::size_t>(kind)];
     }
 
     Kind kind;

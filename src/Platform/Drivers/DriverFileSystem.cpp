@@ -169,7 +169,7 @@ bool DriverFileSystem::CloseFile(Handle file) {
 }
 
 bool DriverFileSystem::Start(Handle file, const Operation& operation, Overlapped& record) {
-    if (CallMustFail(operation.CallName())) {
+    if (CallMustFail("Start")) {
         return RefuseStart(record, LastError());
     }
     const std::shared_ptr<OpenFile> open = files_.Find(file);

@@ -65,7 +65,7 @@ class WindowsDeviceFiles final : public DeviceFileSystem {
     }
 
     bool Start(Handle file, const Operation& operation, Overlapped& record) override {
-        if (CallMustFail(operation.CallName())) {
+        if (CallMustFail("Start")) {
             return false;
         }
         DWORD unused = 0;
