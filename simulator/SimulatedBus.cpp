@@ -12,8 +12,8 @@ namespace Errors = Platform::Errors;
 std::vector<std::string> SimulatedBus::List() {
     const std::lock_guard lock(mutex_);
     std::vector<std::string> names;
-    for (const auto& [name, instrument] : instruments_) {
-        if (instrument->PluggedIn()) {
+    for (const auto& [name, place] : places_) {
+        if (place.instrument->PluggedIn()) {
             names.push_back(name);
         }
     }
@@ -21,27 +21,24 @@ std::vector<std::string> SimulatedBus::List() {
 }
 
 std::shared_ptr<UsbDevice> SimulatedBus::Open(const std::string& name, Platform::ErrorCode& error) {
-    std::shared_ptr<SimulatedInstrument> instrument;
-    std::shared_ptr<FaultScript> script;
+    Place place;
     Wrapper wrap;
     {
         const std::lock_guard lock(mutex_);
-        if (const auto found = instruments_.find(name); found != instruments_.end()) {
-            instrument = found->second;
-        }
-        if (const auto found = faults_.find(name); found != faults_.end()) {
-            script = found->second;
+        if (const auto found = places_.find(name); found != places_.end()) {
+            place = found->second;
         }
         wrap = wrapper_;
     }
+    const std::shared_ptr<SimulatedInstrument> instrument = place.instrument;
     if (!instrument || !instrument->PluggedIn()) {
         error = Errors::FileNotFound;
         return nullptr;
     }
     error = Errors::Success;
     std::shared_ptr<UsbDevice> device = SimulatedInstrument::Connect(instrument);
-    if (script) {
-        device = InjectFaults(std::move(device), std::move(script), scheduler_,
+    if (place.faults) {
+        device = InjectFaults(std::move(device), std::move(place.faults), scheduler_,
                               [instrument] { instrument->Unplug(); });
     }
     return wrap ? wrap(name, std::move(device)) : device;
@@ -50,31 +47,26 @@ std::shared_ptr<UsbDevice> SimulatedBus::Open(const std::string& name, Platform:
 SimulatedInstrument& SimulatedBus::Add(const std::string& name, InstrumentSettings settings) {
     auto instrument = std::make_shared<SimulatedInstrument>(scheduler_, std::move(settings));
     const std::lock_guard lock(mutex_);
-    return *(instruments_[name] = std::move(instrument));
+    return *(places_[name].instrument = std::move(instrument));
 }
 
 SimulatedInstrument& SimulatedBus::Instrument(const std::string& name) {
     const std::lock_guard lock(mutex_);
-    return *instruments_.at(name);
+    return *places_.at(name).instrument;
 }
 
 void SimulatedBus::Remove(const std::string& name) {
     Unplug(name);
-    std::shared_ptr<SimulatedInstrument> removed;  // ends outside the lock: that waits for its events
+    Place removed;  // ends outside the lock: that waits for its events
     const std::lock_guard lock(mutex_);
-    faults_.erase(name);
-    removed = std::move(instruments_.at(name));
-    instruments_.erase(name);
+    removed = places_.at(name);
+    places_.erase(name);
 }
 
 std::shared_ptr<FaultScript> SimulatedBus::SetFaults(const std::string& name, FaultPlan plan) {
     auto script = std::make_shared<FaultScript>(std::move(plan));
     const std::lock_guard lock(mutex_);
-    if (script->Plan().Faults().empty()) {
-        faults_.erase(name);
-    } else {
-        faults_[name] = script;
-    }
+    places_.at(name).faults = script->Plan().Faults().empty() ? nullptr : script;
     return script;
 }
 

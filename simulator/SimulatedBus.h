@@ -48,10 +48,14 @@ class SimulatedBus final : public Platform::Usb::UsbBus {
     void WrapDevices(Wrapper devicesWrapper);
 
   private:
+    struct Place {
+        std::shared_ptr<SimulatedInstrument> instrument;
+        std::shared_ptr<FaultScript> faults;  // null: none
+    };
+
     Platform::EventScheduler& scheduler_;
     std::mutex mutex_;  // guards what follows
-    std::map<std::string, std::shared_ptr<SimulatedInstrument>> instruments_;
-    std::map<std::string, std::shared_ptr<FaultScript>> faults_;
+    std::map<std::string, Place> places_;
     Wrapper wrapper_;
 };
 
