@@ -25,16 +25,18 @@ TEST_P(Schedulers, CallEventsInOrderOfTime) {
         EXPECT_GE(scheduler.Now(), start + due);
         calls.emplace_back(text);
     };
-    scheduler.CallAt(start + 30'000, [&] {
-        note("last", 30'000);
-        SignalEvent(done.Get());
+    scheduler.CallAt(start, [&] {  // planned in an event, so that none begins before all are planned
+        scheduler.CallAt(start + 30'000, [&] {
+            note("last", 30'000);
+            SignalEvent(done.Get());
+        });
+        scheduler.CallAt(start + 10'000, [&] {
+            note("first", 10'000);
+            scheduler.CallAt(0, [&] { note("at once", 10'000); });
+            EXPECT_THAT(calls, ElementsAre("first")) << "called from inside CallAt";
+        });
+        scheduler.CallAt(start + 20'000, [&] { note("second", 20'000); });
     });
-    scheduler.CallAt(start + 10'000, [&] {
-        note("first", 10'000);
-        scheduler.CallAt(0, [&] { note("at once", 10'000); });
-        EXPECT_THAT(calls, ElementsAre("first")) << "called from inside CallAt";
-    });
-    scheduler.CallAt(start + 20'000, [&] { note("second", 20'000); });
     EXPECT_EQ(Wait(done.Get(), LongTimeout), WaitResult::Signalled);
     EXPECT_THAT(calls, ElementsAre("first", "at once", "second", "last"));
 }
