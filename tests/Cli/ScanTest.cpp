@@ -1,4 +1,3 @@
-#include "Platform/EventScheduler.h"
 #include "Protocol/ByteOrder.h"
 #include "ToolFixture.h"
 
@@ -166,6 +165,31 @@ TEST_P(ScanTest, WhatCameIsKept) {
                 Succeed("readout");
             }
         }
+    }
+}
+
+/// With what a transfer that is given up has brought.
+TEST_P(ScanTest, EveryByteBeforeTheEndCounts) {
+    const bool isNative = GetParam() == Transport::Native;
+    const std::size_t first = isNative ? 10 * RecordSize : 65536;  // of a counted scan's transfers
+    for (const auto& [faults, options, bytes, code] :
+         std::vector<std::tuple<const char*, std::string, std::size_t, ExitCode>>{
+             {"bulk-in 2:silent", "--records 1000", 2 * first, ExitCode::Timeout},
+             {"bulk-in 2:late-cancel", "--records 1000", 3 * first, ExitCode::Timeout},
+             {"bulk-in 2:late-cancel", "", isNative ? 22 * RecordSize : 3 * first, ExitCode::Timeout},
+             {"bulk-in 1:short=300", "", (isNative ? 2 * RecordSize : first) + 300,
+              isNative ? ExitCode::InputOutput : ExitCode::Success},
+         }) {
+        SCOPED_TRACE(faults + options);
+        host_.Add("sim", Streaming(1000 * RecordSize));
+        SetFaults(faults);
+        const Stopwatch watch(clock_);
+        EXPECT_EQ(tool_.Run("scan --raw --json --timeout 1 --output @raw " + options), code);
+        // The opening takes a second, and a transfer is given up three behind the time-out.
+        watch.ExpectBetween(code == ExitCode::Timeout ? 5'000 : 1'000, 5'100);
+        EXPECT_EQ(tool_.Json()["bytes"], bytes);
+        ExpectRecordsInOrder(ReadFile(folder_.Path("raw")));
+        std::filesystem::remove(folder_.Path("raw"));
     }
 }
 

@@ -329,6 +329,13 @@ TEST_F(NativeCommands, HandOutTheRecordsOfAScan) {
     driver_.Script(1, {.data = Counting(10, 1)});
     ExpectThrow<IOException>("Read data failed (OverlappedRead)", [&] { instrument_.StartScan(5, 1, 0); });
     EXPECT_THAT(NextRecord(5), IsEmpty()) << "what came before the failure is discarded";
+    struct : ScanReceiver {
+        void Receive(std::span<const std::uint8_t>) override {}
+    } receiver;
+    Scan(10, 1);
+    instrument_.SetScanReceiver(&receiver);
+    Scan(10, 1);
+    EXPECT_THAT(NextRecord(5), IsEmpty()) << "neither of this scan nor of the one before";
 }
 
 }  // namespace

@@ -201,11 +201,17 @@ TEST_F(UsbIoScan, MoreThanWasAskedForIsRefused) {
         void Receive(std::span<const std::uint8_t> data) override { received += data.size(); }
         std::size_t received = 0;
     } receiver;
-    instrument_.SetScanReceiver(&receiver);
+    ScanReceiver* const receivers[] = {nullptr, &receiver};
+    for (ScanReceiver* const each : receivers) {
+        instrument_.SetScanReceiver(each);
+        Send({5000, 0}, 1);
+        instrument_.StartScan(256, 1, 5000);
+    }
+    EXPECT_EQ(TakeAll(), Bytes()) << "neither of this scan nor of the one before";
     Send({Whole}, 1);
     driver_.Script(BulkInEndpoint, tooMuch);
     ExpectRefusal("more bytes read than expected", Whole + 100);
-    EXPECT_EQ(receiver.received, Whole);
+    EXPECT_EQ(receiver.received, 5000 + Whole);
 }
 
 }  // namespace
