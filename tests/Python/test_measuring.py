@@ -145,12 +145,13 @@ def test_events_come_while_readouts_are_taken(ostra_simulated, transport):
 
 
 def test_callbacks_run_beside_and_may_raise_and_close(transport, monkeypatch):
-    seen, reported, ended = [], [], threading.Event()
+    seen, reported, called, ended = [], [], threading.Semaphore(0), threading.Event()
     monkeypatch.setattr(threading, "excepthook", lambda args: reported.append(args.exc_value))
     with ostra.simulated("lab") as lab, ostra.open("lab", transport) as instrument:
 
         def callback(event):
             seen.append(event.kind)
+            called.release()
             if len(seen) == 1:
                 raise RuntimeError("of the callback")
             instrument.close()
@@ -158,12 +159,9 @@ def test_callbacks_run_beside_and_may_raise_and_close(transport, monkeypatch):
 
         instrument.on_event(callback)
         lab.sleep(0.1)
-        for count in (1, 2):
+        for _ in range(2):
             lab.press_button()
-            for _ in range(200):
-                if len(seen) >= count:
-                    break
-                threading.Event().wait(0.02)
+            assert called.acquire(timeout=10)
         assert ended.wait(10) and seen == ["button", "button"]
         assert [str(error) for error in reported] == ["of the callback"]
         assert not instrument.is_open
