@@ -31,20 +31,6 @@ bool IsDocumented(const std::exception& exception) {
             text == "Configuration data dump target too small");
 }
 
-/// False when `action` was refused with an exception that is documented for it.
-template <class Action>
-bool Succeeds(const char* what, Action action) {
-    try {
-        action();
-        return true;
-    } catch (const std::exception& exception) {
-        if (!IsDocumented(exception)) {
-            throw std::logic_error(std::string(what) + ": " + exception.what());
-        }
-        return false;
-    }
-}
-
 Bytes BytesOf(PellandoEEPROM& eeprom, const char* section) {
     Properties set(section);
     eeprom.Load(set);
@@ -79,19 +65,20 @@ Property Resized(Property value, std::uint16_t elements) {
 
 bool RoundTrips(const Bytes& image, const std::vector<Resize>& resizes) {
     std::optional<Service::ImageModel> model;
-    if (!Succeeds("load", [&] { model.emplace(image); })) {
-        return false;
+    Bytes dumped;
+    try {
+        model.emplace(image);
+        for (const auto& [id, elements] : resizes) {
+            model->Get().SetProperty(id, Resized(model->Get().GetProperty(id), elements));
+        }
+        dumped = model->Get().Dump();
+    } catch (const std::exception& exception) {
+        if (IsDocumented(exception)) {
+            return false;
+        }
+        throw;
     }
     PellandoEEPROM& eeprom = model->Get();
-    Bytes dumped;
-    if (!Succeeds("dump", [&] {
-            for (const Resize& resize : resizes) {
-                eeprom.SetProperty(resize.id, Resized(eeprom.GetProperty(resize.id), resize.elements));
-            }
-            dumped = eeprom.Dump();
-        })) {
-        return false;
-    }
     if (!Locates(dumped, eeprom, "LogData", EepromMap::MainLog) ||
         !Locates(dumped, eeprom, "CalibrationData", EepromMap::Calibration)) {
         return false;

@@ -13,8 +13,8 @@ struct Resize {
 
 /// Loads an image of 8192 bytes, resizes values, reads every value, dumps it and loads the dump. True when
 /// that holds the same values, in both copies of the log; false when a step was refused with a documented
-/// exception, or the image's table has values elsewhere than a dump puts them. Anything else throws
-/// `std::logic_error` with what went wrong.
+/// exception, or the image's table has values elsewhere than a dump puts them. Throws what else is thrown,
+/// and `std::logic_error` where values differ.
 bool RoundTrips(const std::vector<std::uint8_t>& image, const std::vector<Resize>& resizes = {});
 
 }  // namespace Varnholt::DeviceDriver::Ostra::LowLevel
