@@ -64,24 +64,15 @@ TEST_P(Exports, ReadoutSendsItsFixedSequenceAndReturnsTheSensorsValues) {
     EXPECT_EQ(std::ranges::count(recorder_.Text(8), '\n'), GetParam() == Transport::Native ? 5 : 4);
 }
 
-TEST_P(Exports, ImageGoesIn32PiecesIntoTheNamedInstrument) {
+TEST_P(Exports, ImageGoesIntoTheNamedInstrument) {
     auto& first = host_.Add("a");
     auto& second = host_.Add("b");
     const auto untouched = first.Eeprom();
     ASSERT_EQ(WriteImage(host_.Identifier("b")), OSTRA_OK) << LastError();
     EXPECT_EQ(second.Eeprom(), image_);
     EXPECT_EQ(first.Eeprom(), untouched);
-    const std::string text = recorder_.Text(1);
-    const std::string reset = "control CA out 1: 1F\n";
-    EXPECT_THAT(text, testing::StartsWith(reset)) << "the one before it was opened and reset as well";
-    std::size_t at = text.find(reset, reset.size());
-    for (std::size_t piece = 0; piece < 32; ++piece) {
-        at = text.find("control C3 out 8: 00", at);
-        ASSERT_NE(at, std::string::npos) << piece;
-        at = text.find("bulk-out 256: ", at);
-    }
-    EXPECT_EQ(text.find("control C3", at), std::string::npos);
-
+    EXPECT_EQ(first.WithCommands([](const auto& commands) { return commands.resets; }), 1U)
+        << "the one before it was opened as well";
     EXPECT_EQ(WriteImage(host_.Identifier("B")), OSTRA_UNKNOWN_FAILURE);
     EXPECT_EQ(LastError(), "");
     first.Unplug();
