@@ -53,22 +53,6 @@ class Locks : public testing::Test {
     Mutex mutex_{Platform::UniqueName("lock")};
 };
 
-TEST_F(Locks, AMutexOfOneNameIsRecursiveAndOneLock) {
-    const std::string name = Platform::UniqueName("recursive");
-    auto original = std::make_unique<SynchronizationObject>(CreateMutexImpl(name));
-    SynchronizationObject copy(*original);
-    Mutex sameName(name), otherCase("O" + name.substr(1));
-    original->Lock();
-    copy.Lock();
-    for (const bool isFree : {false, true}) {
-        original.reset();  // the lock lives with the last of them
-        copy.Unlock();
-        EXPECT_EQ(IsFree(copy), isFree) << "as many unlocks as locks";
-        EXPECT_EQ(IsFree(sameName), isFree);
-        EXPECT_TRUE(IsFree(otherCase));
-    }
-}
-
 TEST_F(Locks, ANamelessMutexIsItsOwnAndHasNoTimeouts) {
     Mutex mutex(""), other("");
     auto hold = std::make_unique<ScopedLock>(mutex);
