@@ -212,26 +212,13 @@ TEST_F(UsbIpServerTest, OneProgramAtATime) {
 }
 
 TEST_F(UsbIpServerTest, FaultsCrossTheConnection) {
-    server_.Add(name_, {},
-                "bulk-in 0:overflow; bulk-in 1:stall; bulk-in 3:late-cancel; control 3:gone-before");
+    server_.Add(name_, {}, "bulk-in 0:stall; control 1:gone-before");
     for (int round = 0; round < 2; ++round) {
         const auto device = OpenAndClaim(name_);
-        Do(*device, TestTransfer::In(BulkInEndpoint, 64), TransferStatus::Overflow);
         Do(*device, TestTransfer::In(BulkInEndpoint, 64), TransferStatus::Stalled);
         ASSERT_EQ(Errors::Success, device->ClearHalt(BulkInEndpoint));
-
         Do(*device, TestTransfer::Memory(Request::ReadEeprom, 4096, 64));
-        EXPECT_EQ(0x01, Do(*device, TestTransfer::In(BulkInEndpoint, 2))[1]);
-        TestTransfer late = TestTransfer::In(BulkInEndpoint, 64);
-        device->Submit(late);
-        Do(*device, TestTransfer::Vendor(Request::ButtonReport, {}));
-        EXPECT_EQ(0, late.completions);
-        device->Cancel(late);
-        ASSERT_TRUE(late.Wait());
-        EXPECT_EQ(TransferStatus::Cancelled, late.status);
-        EXPECT_EQ(62U, late.actualLength);
-
-        Do(*device, TestTransfer::Vendor(Request::Reset, {31}));
+        EXPECT_EQ(0x01, Do(*device, TestTransfer::In(BulkInEndpoint, 64))[1]);
         Do(*device, TestTransfer::Vendor(Request::Reset, {31}), TransferStatus::DeviceGone);
     }
 }
