@@ -1,14 +1,13 @@
 #include <gtest/gtest.h>
 #include <libusb-1.0/libusb.h>
 
-#include <chrono>
 #include <memory>
-#include <thread>
 
 #include "Platform/EventScheduler.h"
 #include "Platform/TestThread.h"
 #include "Platform/Usb/LibUsbEvents.h"
 #include "Platform/WaitableObjects.h"
+#include "Support/DriverTest.h"
 #include "Support/SignalMasks.h"
 
 namespace Varnholt::Platform::Usb {
@@ -62,16 +61,9 @@ TEST_F(LibUsbEventsTest, WaitsEndInTimeLoseNoSignalAndOutlastTheEvents) {
 
 /// An aborted transfer, or the button's, may end when nobody waits.
 TEST_F(LibUsbEventsTest, OneThreadHandlesThemAndTheirOwnWhereNobodyWaits) {
-    const auto isHandled = [this] {
-        const auto patienceEnds = std::chrono::steady_clock::now() + std::chrono::milliseconds(LongTimeout);
-        while (libusb_event_handler_active(context_) == 0 &&
-               std::chrono::steady_clock::now() < patienceEnds) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(1));
-        }
-        return libusb_event_handler_active(context_) != 0;
-    };
+    const auto isHandled = [this] { return libusb_event_handler_active(context_) != 0; };
     EXPECT_EQ(Wait(back_.Get(), 50), WaitResult::TimedOut);
-    EXPECT_TRUE(isHandled());
+    Tests::WaitUntil(isHandled);
     for (int i = 0; i < 2; ++i) {
         EXPECT_TRUE(events_->TryBegin());
         EXPECT_FALSE(events_->TryBegin()) << "another waits with them";
@@ -79,10 +71,10 @@ TEST_F(LibUsbEventsTest, OneThreadHandlesThemAndTheirOwnWhereNobodyWaits) {
     }
     events_->HandleAlways();
     EXPECT_FALSE(events_->TryBegin());
-    EXPECT_TRUE(isHandled());
+    Tests::WaitUntil(isHandled);
     events_->Stop();
     EXPECT_FALSE(events_->TryBegin());
-    EXPECT_EQ(libusb_event_handler_active(context_), 0);
+    EXPECT_FALSE(isHandled());
 }
 
 }  // namespace
