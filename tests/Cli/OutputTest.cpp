@@ -163,61 +163,44 @@ TEST_F(FileTest, AnAtomicFileTakesItsNameWhenItIsComplete) {
 
 TEST_F(FileTest, ARecordingEndsWithWhatIsWorthKeeping) {
     enum End { Complete, Keep, Discard, Nothing };
-    struct Case {
-        const char* name;
-        bool existed;
-        int records;
-        End end;
-        Names files;               ///< name and content
-        const char* remains = "";  ///< the file that is told, and one that was there
-        const char* earlier = "";
-    };
-    for (const Case& row : {
-             Case{"complete", false, 2, Complete, {"f=head,1,2,"}},
-             Case{"complete, over another", true, 2, Complete, {"f=head,1,2,"}},
-             Case{"complete without records", true, 0, Complete, {"f=head,"}},
-             Case{"early", false, 2, Keep, {"f=head,1,2,"}, "f"},
-             Case{"early, another there", true, 2, Keep, {"f=old", "f.part=head,1,2,"}, "f.part", "f"},
-             Case{"early without records", true, 0, Keep, {"f=old"}},
-             Case{"discarded", true, 2, Discard, {"f=old"}},
-             Case{"discarded, nothing there", false, 2, Discard, {}},
-             Case{"left alone", false, 1, Nothing, {"f=head,1,"}},
-             Case{"left alone, another there", true, 1, Nothing, {"f=old", "f.part=head,1,"}},
+    // What there is in the end: names and content.
+    for (const auto& [end, records, files] : std::vector<std::tuple<End, int, Names>>{
+             {Complete, 0, {"f=head,"}},
+             {Keep, 2, {"f=old", "f.part=head,1,2,"}},
+             {Keep, 0, {"f=old"}},
+             {Discard, 2, {"f=old"}},
+             {Nothing, 1, {"f=old", "f.part=head,1,"}},
          }) {
-        SCOPED_TRACE(row.name);
-        for (const std::string& name : folder_.Files()) {
-            std::filesystem::remove(folder_.Path(name));
-        }
-        std::filesystem::perms permissions{};
-        if (row.existed) {
-            WriteFile(path_, {'o', 'l', 'd'});
-            std::filesystem::permissions(path_, std::filesystem::perms::owner_all);
-            permissions = std::filesystem::status(path_).permissions();
-        }
+        SCOPED_TRACE(end);
+        std::filesystem::remove(folder_.Path("f.part"));
+        WriteFile(path_, {'o', 'l', 'd'});
+        std::filesystem::permissions(path_, std::filesystem::perms::owner_all);
+        const auto permissions = std::filesystem::status(path_).permissions();
         RecordOutput::Remains remains;
         {
             RecordingFile file(path_, none_);
             EXPECT_THROW(RecordingFile(path_, none_), FileError) << "two at once";
             file.Append(std::string("head,"), 0);
-            for (int i = 1; i <= row.records; ++i) {
+            for (int i = 1; i <= records; ++i) {
                 file.Append(std::to_string(i) + ',', 1);
             }
-            if (row.end == Complete) {
+            if (end == Complete) {
                 file.Complete();
-            } else if (row.end == Keep) {
+            } else if (end == Keep) {
                 remains = file.KeepWholeRecords();
-            } else if (row.end == Discard) {
+            } else if (end == Discard) {
                 file.Discard();
             }
         }
-        EXPECT_EQ(remains.file, *row.remains != '\0' ? folder_.Path(row.remains) : "");
-        EXPECT_EQ(remains.earlier, *row.earlier != '\0' ? folder_.Path(row.earlier) : "");
+        const bool isKept = end == Keep && records > 0;
+        EXPECT_EQ(remains.file, isKept ? folder_.Path("f.part") : "");
+        EXPECT_EQ(remains.earlier, isKept ? path_ : "");
         Names found;
         for (const std::string& name : folder_.Files()) {
             found.push_back(name + '=' + Content(name));
         }
-        EXPECT_EQ(found, row.files);
-        EXPECT_TRUE(!row.existed || std::filesystem::status(path_).permissions() == permissions);
+        EXPECT_EQ(found, files);
+        EXPECT_EQ(std::filesystem::status(path_).permissions(), permissions);
     }
 }
 
