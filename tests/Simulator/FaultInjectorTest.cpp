@@ -17,7 +17,6 @@ namespace {
 using namespace Platform::Usb;
 using namespace Protocol;
 using namespace Tests;
-namespace Errors = Platform::Errors;
 using Platform::SleepMilliseconds;
 
 constexpr std::uint32_t ReadLength = 64;

@@ -31,7 +31,6 @@ namespace {
 using namespace Platform::Usb;
 using namespace Protocol;
 using namespace Tests;
-namespace Errors = Platform::Errors;
 namespace UsbIp = Platform::Usb::UsbIp;
 
 /// A server with its loop on a thread of its own, as if it were another program.

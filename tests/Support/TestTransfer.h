@@ -23,6 +23,8 @@ inline void PrintTo(TransferStatus status, std::ostream* stream) {
 
 namespace Varnholt::Tests {
 
+namespace Errors = Platform::Errors;
+
 /// A transfer with its buffer that counts its completions, on whatever thread they come.
 struct TestTransfer final : Platform::Usb::Transfer, private Platform::Usb::TransferClient {
     using Bytes = std::vector<std::uint8_t>;

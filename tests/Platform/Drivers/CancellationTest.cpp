@@ -19,9 +19,6 @@
 namespace Varnholt::Tests {
 namespace {
 
-namespace Errors = Platform::Errors;
-namespace Native = Protocol::NativeDriver;
-
 /// How the reads of one round are ended besides by their data.
 enum class Ending { Cancel, AbortFromOtherThread, CloseFromOtherThread, CloseAtOnce };
 

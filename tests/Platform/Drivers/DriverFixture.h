@@ -19,6 +19,9 @@
 
 namespace Varnholt::Tests {
 
+namespace Errors = Platform::Errors;
+namespace Native = Protocol::NativeDriver;
+
 inline constexpr std::uint8_t In = Protocol::BulkInEndpoint;
 
 /// How a request ended.

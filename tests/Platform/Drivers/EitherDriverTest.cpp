@@ -5,8 +5,6 @@
 namespace Varnholt::Tests {
 namespace {
 
-namespace Errors = Platform::Errors;
-namespace Native = Protocol::NativeDriver;
 namespace UsbIo = Protocol::UsbIoDriver;
 using namespace Platform;
 using namespace Protocol;

@@ -3,8 +3,6 @@
 namespace Varnholt::Tests {
 namespace {
 
-namespace Errors = Platform::Errors;
-namespace Native = Protocol::NativeDriver;
 using Protocol::BulkInEndpoint;
 
 class NativeDriver : public DriverFixture {};

@@ -13,8 +13,6 @@
 namespace Varnholt::Tests {
 namespace {
 
-namespace Errors = Platform::Errors;
-namespace Native = Protocol::NativeDriver;
 using namespace Platform;
 
 constexpr std::uint8_t Interrupt = Protocol::InterruptInEndpoint;

@@ -5,7 +5,6 @@
 namespace Varnholt::Tests {
 namespace {
 
-namespace Errors = Platform::Errors;
 namespace Code = Protocol::UsbIoDriver::Control;
 namespace Status = Protocol::UsbIoDriver::Status;
 
