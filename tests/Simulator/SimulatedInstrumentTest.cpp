@@ -11,7 +11,6 @@ namespace {
 using namespace Platform::Usb;
 using namespace Protocol;
 using namespace Tests;
-namespace Errors = Platform::Errors;
 
 class SimulatedInstrumentTest : public testing::Test {
   protected:
@@ -139,6 +138,7 @@ TEST_F(SimulatedInstrumentTest, UnplugLosesWhatIsVolatile) {
     EXPECT_EQ(Errors::DeviceNotConnected, device_->Claim());
     EXPECT_EQ(0, after.completions);
     instrument_->PlugIn();
+    EXPECT_EQ(Errors::DeviceNotConnected, device_->Claim()) << "it was opened before the unplugging";
     EXPECT_EQ(Errors::Success, SimulatedInstrument::Connect(instrument_)->Claim());
     instrument_->WithCommands([](const Commands& state) {
         EXPECT_EQ(MeasureParameters(), state.parameters);
@@ -190,14 +190,8 @@ TEST(SimulatedConnectionTest, EachOpeningHasItsOwnClaimAndTransfers) {
     EXPECT_EQ(1, pending.completions);
     EXPECT_EQ(0, ofOther.completions);
     EXPECT_EQ(Errors::Success, other->Claim());
-
     instrument->Unplug();
-    instrument->PlugIn();
-    EXPECT_EQ(1, ofOther.completions);
     EXPECT_EQ(TransferStatus::DeviceGone, ofOther.status);
-    EXPECT_EQ(Errors::DeviceNotConnected, other->Claim())
-        << "it was opened before the instrument was unplugged";
-    EXPECT_EQ(Errors::Success, SimulatedInstrument::Connect(instrument)->Claim());
 }
 
 }  // namespace
