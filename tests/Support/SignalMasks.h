@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <filesystem>
 #include <fstream>
+#include <iterator>
 #include <map>
 #include <string>
 #include <thread>
@@ -19,19 +20,14 @@ namespace Varnholt::Tests {
 inline std::map<std::string, std::uint64_t> MasksOfOtherThreads() {
     std::map<std::string, std::uint64_t> masks;
     for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {
-        std::ifstream status(task.path() / "status");
-        std::string word;
-        while (status >> word && word != "Threads:") {
-        }
-        int threads = 0;
-        status >> threads;
-        while (status >> word && word != "SigBlk:") {
-        }
-        std::uint64_t mask = 0;
+        std::ifstream file(task.path() / "status");
+        const std::string status{std::istreambuf_iterator<char>(file), {}}, name = "SigBlk:";
+        const std::size_t mask = status.find(name);
         // A thread that ends meanwhile has no status any more, or one that counts no threads and tells no
         // mask.
-        if (task.path().filename() != std::to_string(gettid()) && status >> std::hex >> mask && threads > 0) {
-            masks[task.path().filename()] = mask;
+        if (task.path().filename() != std::to_string(gettid()) && mask != std::string::npos &&
+            status.find("Threads:\t0\n") == std::string::npos) {
+            masks[task.path().filename()] = std::stoull(status.substr(mask + name.size()), nullptr, 16);
         }
     }
     return masks;
