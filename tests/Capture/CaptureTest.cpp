@@ -148,7 +148,6 @@ TEST(CaptureTest, HoldsEveryTransferAsUsbmonDoes) {
 TEST(DescribeRequestTest, SaysWhatTheBytesMean) {
     for (const auto& [request, size, text] : std::vector<std::tuple<int, std::size_t, std::string>>{
              {0xA0, 8, "DownloadRAMFirmware address=0x20AB"},
-             {0xC0, 0, "Measure"},
              {0xC1, 8, "SetMeasureParameters p1=258 p2=772 p3=1286 p4=7"},
              {0xC2, 8, "GetMeasureParameters p1=258 p2=772 p3=1286 p4=7 p5=8"},
              {0xC2, 7, "GetMeasureParameters p1=258 p2=772 p3=1286 p4=7"},
@@ -157,10 +156,8 @@ TEST(DescribeRequestTest, SaysWhatTheBytesMean) {
              {0xC7, 6, "WriteCPLD c1=258 c2=772 c3=1286"},
              {0xC8, 2, "ReadCPLD value=258"},
              {0xC9, 8, "GetMISC m1=7 m2=258 m3=8 m4=772 m5=1286"},
-             {0xCA, 1, "Reset code=1"},
              {0xCB, 8, "DownloadEEPROMFirmware address=16909060 length=1286"},
              {0xCF, 1, "SetMeasureMode mode=1"},
-             {0xD0, 8, "ButtonReport"},
              {0xD1, 6, "GetMeasureMode m1=1 m2=2 m3=3 m4=4 m5=5 m6=6"},
              {0xD2, 8, "GetChipID"},
              {0x9F, 8, "vendor request 0x9F"},

@@ -282,8 +282,6 @@ TEST_F(FileTest, ALinkStaysAndADeviceIsWrittenTo) {
 
 /// In zones that a POSIX text describes, so that no data base is needed.
 TEST(WallTimeTextTest, LocalTimeAndItsZone) {
-    const char* const before = std::getenv("TZ");
-    const std::string zoneBefore = before != nullptr ? before : "";
     for (const auto& [zone, seconds, text] : std::vector<std::tuple<const char*, std::int64_t, const char*>>{
              {"UTC0", 1'795'653'632, "2026-11-26T00:40:32.123+00:00"},
              {"CET-1CEST,M3.5.0,M10.5.0/3", 1'795'653'632, "2026-11-26T01:40:32.123+01:00"},
@@ -294,8 +292,6 @@ TEST(WallTimeTextTest, LocalTimeAndItsZone) {
         ::tzset();
         EXPECT_EQ(WallTimeText({seconds, 123}), text);
     }
-    before != nullptr ? ::setenv("TZ", zoneBefore.c_str(), 1) : ::unsetenv("TZ");
-    ::tzset();
 }
 #endif
 

@@ -17,6 +17,7 @@
 #include "Service/Memory/ImageModel.h"
 #include "Service/Memory/ImageTransport.h"
 #include "Service/Memory/PropertyText.h"
+#include "Support/Bytes.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -28,9 +29,7 @@ namespace Map = Protocol::EepromMap;
 EepromImage UsedImage() {
     EepromImage image = FreshImage();
     image = WithCalibration(image, {{1211, "77"}, {1000, "0.5,-2"}}).image;
-    std::vector<std::uint8_t> block(Map::BinarySize);
-    std::ranges::generate(block, [byte = std::uint8_t{0}]() mutable { return byte += 3; });
-    image = WithBinaryBlock(image, block);
+    image = WithBinaryBlock(image, CountingImage(3, Map::BinarySize));
     SetRawWord(image, 10203, 0x01020304);
     image[8000] = 0x42;
     return image;
@@ -152,8 +151,7 @@ TEST(ImageEditTest, RefusesWhatItCannotProve) {
 
 TEST(ImageEditTest, BinaryBlockLiesInTwoPlaces) {
     const EepromImage before = UsedImage();
-    std::vector<std::uint8_t> block(Map::BinarySize);
-    std::ranges::generate(block, [byte = std::uint8_t{0}]() mutable { return byte += 7; });
+    const std::vector<std::uint8_t> block = CountingImage(0, Map::BinarySize);
     const EepromImage after = WithBinaryBlock(before, block);
     EXPECT_EQ(BinaryBlockOf(after), block);
     EXPECT_EQ(ImageModel(after).Get().LoadBinary(10100), block) << "as the driver sees it";
@@ -269,12 +267,8 @@ TEST(ImageDiffTest, ByValueThenByArea) {
     b[8191] = 0;
     const ImageDiff diff = Compare(a, b);
     ASSERT_EQ(diff.values.size(), 2u);
-    const auto text = [](const ImageDiff::Value& value) {
-        return value.kind + " " + std::to_string(value.id) + ": " + TextOf(*value.a) + " -> " +
-               TextOf(*value.b);
-    };
-    EXPECT_EQ(text(diff.values[0]), "calibration 1211: 77 -> 78");
-    EXPECT_EQ(text(diff.values[1]).substr(0, 11), "word 10215:");
+    EXPECT_EQ(diff.values[0].id, 1211);
+    EXPECT_EQ(diff.values[1].kind + " " + std::to_string(diff.values[1].id), "word 10215");
     std::string areas;
     for (const ImageDiff::Area& area : diff.areas) {
         areas += area.name + " " + std::to_string(area.first) + "-" + std::to_string(area.last) + ": " +
