@@ -2,13 +2,10 @@
 
 #include <gtest/gtest.h>
 
-#include <cstdint>
 #include <optional>
 #include <string>
 
-#ifndef _WIN32
-#include "VirtualClock.h"
-#endif
+#include "Support/TestClock.h"
 
 namespace Varnholt::Platform {
 
@@ -17,22 +14,17 @@ namespace Varnholt::Platform {
 class EachClock : public testing::TestWithParam<int> {
   public:
     static constexpr int RealClock = -1;
-
-#ifndef _WIN32
-    static constexpr int Seeds = 8;
+    static constexpr int Seeds = Tests::TestClock::SeedsToTry > 1 ? 8 : 0;
 
   protected:
-    void SetUp() override {
+    EachClock() {
         if (GetParam() != RealClock) {
-            clock_.emplace(static_cast<std::uint64_t>(GetParam()));
+            clock_.emplace(Tests::TestTime::Virtual, static_cast<std::uint64_t>(GetParam()));
         }
     }
 
   private:
-    std::optional<Simulator::VirtualClock> clock_;
-#else
-    static constexpr int Seeds = 0;
-#endif
+    std::optional<Tests::TestClock> clock_;
 };
 
 inline std::string NameOfClock(const testing::TestParamInfo<int>& info) {
