@@ -9,14 +9,6 @@ import pytest
 import ostra
 
 
-@pytest.fixture
-def broken():
-    content = bytearray(bytes(ostra.Image()))
-    content[ostra.Image().table[1000] :] = b"\0" * (8192 - ostra.Image().table[1000])
-    content[0x1000:0x1002] = b"\0\0"
-    return bytes(content)
-
-
 def test_values_are_read_and_changed_and_nothing_else(tmp_path):
     image = ostra.Image()
     before = image.copy()
@@ -59,8 +51,10 @@ def test_what_cannot_be_changes_nothing(change, kind):
     assert image == ostra.Image()
 
 
-def test_writing_keeps_checks_and_verifies(ostra_simulated, transport, tmp_path, monkeypatch, broken):
+def test_writing_keeps_checks_and_verifies(ostra_simulated, transport, tmp_path, monkeypatch):
     monkeypatch.chdir(tmp_path)
+    broken = bytearray(bytes(ostra.Image()))
+    broken[0x1000:0x1002] = b"\0\0"
     lab = ostra_simulated("lab")
     with ostra.open("lab", transport) as instrument:
         before = instrument.eeprom.read()

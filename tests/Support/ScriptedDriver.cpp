@@ -169,18 +169,15 @@ bool ScriptedDriver::Start(Handle handle, const Operation& operation, Overlapped
     if (!file) {
         return false;
     }
-    switch (operation.kind) {
-        case Operation::Kind::Read:
-            return Begin(*file, operation, Line("read", file->place) + Room(operation.length), operation.data,
-                         {.after = Never}, record);
-        case Operation::Kind::Write:
-            return Begin(*file, operation,
-                         Line("write", file->place) + Sent({operation.data, operation.length}), nullptr, {},
-                         record);
-        case Operation::Kind::Control:
-            break;
+    if (operation.kind == Operation::Kind::Control) {
+        return Control(*file, operation, record);
     }
-    return Control(*file, operation, record);
+    const auto& [kind, data, length, code, input] = operation;
+    return kind == Operation::Kind::Read
+               ? Begin(*file, operation, Line("read", file->place) + Room(length), data, {.after = Never},
+                       record)
+               : Begin(*file, operation, Line("write", file->place) + Sent({data, length}), nullptr, {},
+                       record);
 }
 
 bool ScriptedDriver::Control(File& file, const Operation& operation, Overlapped& record) {

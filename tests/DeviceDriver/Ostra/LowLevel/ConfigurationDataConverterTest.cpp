@@ -6,7 +6,6 @@
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/ConfigurationDataConverter.h"
-#include "Support/ExpectThrow.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace {

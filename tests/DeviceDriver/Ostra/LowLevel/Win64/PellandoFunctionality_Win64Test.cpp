@@ -91,11 +91,6 @@ TEST_F(UsbIoOpening, EachOfItsStepsCanFail) {
 
 constexpr std::uint32_t Whole = 65536;
 
-/// Bytes of a stream, different from one 256-byte record to the next.
-Bytes Stream(std::size_t count) {
-    return CountingImage(0, count);
-}
-
 class UsbIoScan : public UsbIoTest {
   protected:
     UsbIoScan() {
@@ -111,7 +106,7 @@ class UsbIoScan : public UsbIoTest {
     void Send(const std::vector<std::uint32_t>& sizes, std::uint32_t after) {
         std::size_t sent = 0;
         for (const std::uint32_t size : sizes) {
-            const Bytes all = Stream(sent + size);
+            const Bytes all = CountingImage(0, sent + size);
             driver_.Script(
                 BulkInEndpoint,
                 {.data = Bytes(all.begin() + static_cast<std::ptrdiff_t>(sent), all.end()), .after = after});
@@ -163,7 +158,7 @@ TEST_F(UsbIoScan, FixedScansEndWithTheirSizeOrAShortTransfer) {
             }
             expected.emplace_back("cancel 82");
             EXPECT_THAT(TakeTranscript(), ElementsAreArray(expected));
-            EXPECT_EQ(TakeAll(), Stream(end));
+            EXPECT_EQ(TakeAll(), CountingImage(0, end));
             EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
         }
     }
@@ -179,7 +174,7 @@ TEST_F(UsbIoScan, OpenEndedScansGrowAndBeepOnceEach) {
         const Stopwatch stopwatch(clock_);
         instrument_.StartScan(256, 1, 0);
         EXPECT_LT(stopwatch.Milliseconds(), 300U) << "a scan does not wait for its beep";
-        EXPECT_EQ(TakeAll(100000), Stream(total)) << total;
+        EXPECT_EQ(TakeAll(100000), CountingImage(0, total)) << total;
         EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
         ASSERT_EQ(Platform::Wait(beeped_.Get(), 10000), Platform::WaitResult::Signalled);
         stopwatch.ExpectBetween(370, 372);
