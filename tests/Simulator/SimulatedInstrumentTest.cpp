@@ -1,8 +1,11 @@
 #include <gtest/gtest.h>
 
+#include "Platform/Threads.h"
 #include "Protocol/ByteOrder.h"
+#include "SchedulerInForce.h"
 #include "SimulatedInstrument.h"
 #include "Support/Bytes.h"
+#include "Support/TestClock.h"
 #include "Support/TestTransfer.h"
 
 namespace Varnholt::Simulator {
@@ -146,27 +149,20 @@ TEST_F(SimulatedInstrumentTest, UnplugLosesWhatIsVolatile) {
     });
 }
 
-/// A clock that stands still and whose events nobody hears of.
-class StoppedScheduler final : public Platform::EventScheduler {
-  public:
-    std::uint64_t Now() override { return 0; }
-    void CallAt(std::uint64_t, std::function<void()>, const void*) override { ++events; }
-    void Forget(const void*) override {}
-
-    int events = 0;
-};
-
+/// The clock may be another when the next data are waited for.
 TEST(SimulatedConnectionTest, WhatWasDueBeforeAnUnpluggingIsNotWaitedForAfterwards) {
-    StoppedScheduler scheduler;
+    SchedulerInForce scheduler;
     const auto instrument =
         std::make_shared<SimulatedInstrument>(scheduler, InstrumentSettings{.takesIntegrationTime = true});
-    for (const int expected : {1, 2}) {
+    for (const bool isWaitedFor : {false, true}) {
+        const TestClock clock(TestTime::Virtual);
         TestTransfer measure = TestTransfer::Vendor(Request::Measure);
         TestTransfer readout = TestTransfer::In(BulkInEndpoint, 256);
         const auto connection = SimulatedInstrument::Connect(instrument);
         connection->Submit(measure);
         connection->Submit(readout);
-        EXPECT_EQ(expected, scheduler.events);
+        Platform::SleepMilliseconds(isWaitedFor ? 1000 : 0);
+        EXPECT_EQ(isWaitedFor ? 1 : 0, readout.completions);
         instrument->Unplug();
         instrument->PlugIn();
     }
