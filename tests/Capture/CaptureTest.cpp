@@ -148,10 +148,8 @@ TEST(CaptureTest, HoldsEveryTransferAsUsbmonDoes) {
 TEST(DescribeRequestTest, SaysWhatTheBytesMean) {
     for (const auto& [request, size, text] : std::vector<std::tuple<int, std::size_t, std::string>>{
              {0xA0, 8, "DownloadRAMFirmware address=0x20AB"},
-             {0xC1, 8, "SetMeasureParameters p1=258 p2=772 p3=1286 p4=7"},
              {0xC2, 8, "GetMeasureParameters p1=258 p2=772 p3=1286 p4=7 p5=8"},
              {0xC2, 7, "GetMeasureParameters p1=258 p2=772 p3=1286 p4=7"},
-             {0xC3, 8, "WriteEEPROM address=16909060 length=1286"},
              {0xC4, 5, "ReadEEPROM address=16909060"},
              {0xC7, 6, "WriteCPLD c1=258 c2=772 c3=1286"},
              {0xC8, 2, "ReadCPLD value=258"},

@@ -23,21 +23,11 @@ using Linux::UserDirectory;
 
 /// Puts something in the place of a file or a directory of ours; false where only root can do that.
 using Squatter = bool (*)(const std::string& path);
-bool File(const std::string& path) {
-    return std::ofstream(path).is_open();
-}
-bool Directory(const std::string& path) {
-    return mkdir(path.c_str(), 0777) == 0;
-}
-bool Pipe(const std::string& path) {
-    return mkfifo(path.c_str(), 0600) == 0;
-}
-bool Link(const std::string& path) {
-    return symlink(testing::TempDir().c_str(), path.c_str()) == 0;
-}
-bool DeadLink(const std::string& path) {
-    return symlink("/nonexistent", path.c_str()) == 0;
-}
+constexpr Squatter File = [](const std::string& path) { return std::ofstream(path).is_open(); };
+constexpr Squatter Directory = [](const std::string& path) { return mkdir(path.c_str(), 0777) == 0; };
+constexpr Squatter Pipe = [](const std::string& path) { return mkfifo(path.c_str(), 0600) == 0; };
+constexpr Squatter Link = [](const std::string& path) { return symlink(".", path.c_str()) == 0; };
+constexpr Squatter DeadLink = [](const std::string& path) { return symlink("/none", path.c_str()) == 0; };
 template <Squatter Make>
 bool GivenAway(const std::string& path) {
     return geteuid() == 0 && Make(path) && chown(path.c_str(), 1, 1) == 0;
@@ -90,7 +80,7 @@ TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
 }
 
 TEST_F(SharedFiles, ThatAreNoFilesOfOursAreRefused) {
-    for (const Squatter squatter : {&Link, &DeadLink, &Directory, &Pipe, &GivenAway<&File>}) {
+    for (const Squatter squatter : {Link, DeadLink, Directory, Pipe, &GivenAway<File>}) {
         if (!squatter(path_)) {
             EXPECT_NE(geteuid(), 0u);
             continue;
@@ -147,7 +137,7 @@ class UserDirectories : public testing::Test {
 TEST_F(UserDirectories, AreFoundBesideWhatOthersPutInTheirPlace) {
     std::string expected = first_;
     int taken = 0;
-    for (const Squatter squatter : {&File, &Pipe, &Link, &DeadLink, &GivenAway<&Directory>}) {
+    for (const Squatter squatter : {File, Pipe, Link, DeadLink, &GivenAway<Directory>}) {
         SCOPED_TRACE(taken);
         if (!squatter(expected)) {
             EXPECT_NE(geteuid(), 0u);
