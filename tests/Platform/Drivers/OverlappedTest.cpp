@@ -6,6 +6,7 @@
 
 #include "Platform/Drivers/DriverFixture.h"
 #include "Platform/EventScheduler.h"
+#include "Platform/OverlappedRequest.h"
 #include "Platform/TestThread.h"
 #include "Platform/Threads.h"
 #include "Support/FailCalls.h"
@@ -44,6 +45,19 @@ TEST_F(OverlappedFiles, SignalAtCompletionAndResetAtStart) {
     EXPECT_TRUE(StartRead(pipe_, buffer_, request_)) << "completed inside the start";
     EXPECT_TRUE(request_.TakeSignal());
     EXPECT_EQ(Result(pipe_, request_), (Outcome{0, 1}));
+}
+
+TEST_F(OverlappedFiles, RequestsEndBeforeTheyStartAnew) {
+    const ScopedDeviceFiles inForce(*files_);
+    OverlappedRequest request(request_.event.Get());
+    Bytes other(8);
+    for (Bytes* const buffer : {&buffer_, &other}) {
+        EXPECT_EQ(ErrorOf(request.Start(pipe_, Operation::Read(buffer->data(), 8))), Errors::IoPending);
+    }
+    device_->Send(In, {7});
+    std::uint32_t moved = 0;
+    EXPECT_TRUE(request.GetResult(moved, true));
+    EXPECT_EQ(std::pair(moved, other[0]), std::pair(1U, std::uint8_t{7}));
 }
 
 // Without an event of the record, and where none can be had.
