@@ -170,9 +170,7 @@ bool InterruptibleDeviceFiles::CloseFile(Handle file) {
     return below_.CloseFile(file);
 }
 
-bool InterruptibleDeviceFiles::Refuse(Overlapped& record, ErrorCode code) {
-    record.internal = 0;
-    record.internalHigh = 0;
+bool InterruptibleDeviceFiles::Refuse(const Overlapped& record, ErrorCode code) {
     if (record.event != NoHandle) {
         SignalEvent(record.event);
     }

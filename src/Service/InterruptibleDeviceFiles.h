@@ -68,7 +68,7 @@ class InterruptibleDeviceFiles final : public Platform::DeviceFileSystem {
 
     Description DescriptionOf(const OpenedFile* opened, const Platform::Operation& operation) const;
     void Ended(const Overlapped& record, std::uint32_t transferred, bool succeeded);
-    static bool Refuse(Overlapped& record, Platform::ErrorCode code);
+    static bool Refuse(const Overlapped& record, Platform::ErrorCode code);
     void AbortPipe(const OpenedFile& file);
     void Control(Handle file, std::uint32_t code, std::span<const std::uint8_t> block);
     OpenedFile* Find(Handle file);
