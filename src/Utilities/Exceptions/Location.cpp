@@ -18,13 +18,8 @@ std::size_t StartOfParameterList(std::string_view text) {
     return std::string_view::npos;
 }
 
-/// Position where the name begins: behind the last blank that is outside every bracket, except the blank
-/// that belongs to a conversion operator's or spaced operator's name.
+/// Position where the name begins: behind the last blank that is outside every bracket.
 std::size_t StartOfName(std::string_view text) {
-    const std::size_t spacedOperator = text.rfind("operator ");
-    if (spacedOperator != std::string_view::npos) {
-        text = text.substr(0, spacedOperator);
-    }
     int depth = 0;
     for (std::size_t i = text.size(); i-- > 0;) {
         const char c = text[i];

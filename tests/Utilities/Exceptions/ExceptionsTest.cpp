@@ -51,6 +51,7 @@ TEST(Exceptions, QualifiedNamesComeOutOfSignatures) {
         {"const T* N::P<T>::operator->() const [with T = N::A<int>]", "N::P<N::A<int>>::operator ->"},
         {"N::P<T>& N::P<T>::operator=(const N::P<T>&) [with T = int]", "N::P<int>::operator="},
         {"bool N::A::operator()(int) const", "N::A::operator()"},
+        {"N::A::operator bool() const", "N::A::operator bool"},
         {"N::P<T>::P() [with T = int]", "N::P<int>::P"},
         {"void N::{anonymous}::f(int)", "N::{anonymous}::f"},
     };
