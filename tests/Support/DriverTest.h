@@ -32,6 +32,10 @@ using testing::ElementsAre;
 using testing::ElementsAreArray;
 using testing::IsEmpty;
 
+inline std::string ErrorSuffix(Platform::ErrorCode code) {
+    return " (Win32 Error (" + std::to_string(code) + ") : " + Platform::ErrorText(code) + ")";
+}
+
 /// The scripted driver as the device files in force.
 class DriverTest : public testing::Test {
   protected:

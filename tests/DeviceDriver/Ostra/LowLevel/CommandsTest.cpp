@@ -8,9 +8,8 @@
 #include "Platform/ScopedThreadPriority.h"
 #include "Protocol/Instrument.h"
 #include "Protocol/UsbIoDriver.h"
-#include "Support/Transport.h"
+#include "Support/DriverTest.h"
 #include "Utilities/Exceptions/Exceptions.h"
-#include "Win32/NativeTest.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -301,7 +300,7 @@ TEST_P(Commands, NameTheInstrumentThatIsNotThere) {
     }
 }
 
-class NativeCommands : public NativeTest {
+class NativeCommands : public DriverTest {
   protected:
     Bytes NextRecord(std::uint32_t size) {
         Bytes buffer(size);

@@ -4,8 +4,9 @@
 
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
-#include "NativeTest.h"
 #include "Platform/CallFilter.h"
+#include "Protocol/NativeDriver.h"
+#include "Support/DriverTest.h"
 #include "Utilities/Multithreading/Mutex.h"
 #include "Utilities/Multithreading/ScopedLock.h"
 
@@ -16,13 +17,16 @@ using namespace Platform;
 using namespace DeviceDriver::Generic;
 using namespace DeviceDriver::Ostra::LowLevel;
 using Protocol::NativeDriver::ControlBlock;
+using Protocol::NativeDriver::InterruptPipe;
 using namespace Varnholt::Utilities::Multithreading;
 
-constexpr std::uint32_t InterruptPipe = 3;
 const Answer ButtonData{.data = {1}};
 const std::string Path = "native/1";
 
-using UsbConnection = NativeTest;
+class UsbConnection : public DriverTest {
+  protected:
+    UsbConnection() : DriverTest(TestTime::Virtual) {}
+};
 
 TEST_F(UsbConnection, LeavesNothingOpenOfWhatItCannotMakeOrOpensAnew) {
     driver_.RefuseOpen("native/1\\PIPE01", Errors::AccessDenied);
@@ -115,13 +119,11 @@ void ReadOneByte(PellandoUSBDevice& device) {
     device.ReadData(&byte, 1, 0);
 }
 
-class NativeDevice : public NativeTest {
+class NativeDevice : public DriverTest {
   protected:
-    NativeDevice() : NativeTest(TestTime::RealForThreadSanitizer) {}
-
     std::unique_ptr<PellandoUSBDevice> Open() {
         auto device = std::make_unique<PellandoUSBDevice>(&listener_, Path);
-        WaitUntil([this] { return IsListening(); });
+        WaitUntil([this] { return driver_.Running(InterruptPipe) == 1; });
         return device;
     }
     RecordingListener listener_;

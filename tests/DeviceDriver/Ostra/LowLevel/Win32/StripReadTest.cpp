@@ -1,8 +1,8 @@
 
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
-#include "NativeTest.h"
 #include "Platform/CallFilter.h"
 #include "Platform/Time.h"
+#include "Support/DriverTest.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -24,13 +24,15 @@ Bytes Content(const ScanRecordList& records, std::uint32_t recordSize) {
     return content;
 }
 
-class NativeStripRead : public NativeTest {
+class NativeStripRead : public DriverTest {
   protected:
+    NativeStripRead() : DriverTest(TestTime::Virtual) {}
+
     void SetUp() override {
         ObserveBeeps([this](std::uint32_t hertz, std::uint32_t milliseconds) {
             beeps_.push_back(std::to_string(hertz) + "/" + std::to_string(milliseconds));
         });
-        WaitUntil([this] { return IsListening(); });
+        WaitUntil([this] { return driver_.Running() == 1; });
         driver_.TakeTranscript();
     }
     void TearDown() override { ObserveBeeps({}); }
