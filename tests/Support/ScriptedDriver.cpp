@@ -110,11 +110,6 @@ std::size_t ScriptedDriver::Running(std::optional<std::uint32_t> place) const {
                  : running_.size();
 }
 
-std::uint64_t ScriptedDriver::BytesIn(std::uint32_t place) {
-    const std::lock_guard held(lock_);
-    return bytesIn_[place];
-}
-
 std::vector<std::string> ScriptedDriver::ListInterfaces(const Protocol::Guid& interfaceClass) {
     std::vector<std::string> listed;
     std::ranges::copy_if(paths_, std::back_inserter(listed), [&](const std::string& path) {
@@ -265,7 +260,6 @@ void ScriptedDriver::End(std::uint64_t number, ErrorCode code, bool withData) {
         if (found->target) {
             moved = std::min(moved, found->answer.data.size());
             std::copy_n(found->answer.data.begin(), moved, found->target);
-            bytesIn_[found->place] += moved;
         }
         found->record->internalHigh = found->answer.count.value_or(static_cast<std::uint32_t>(moved));
         found->record->offset = code;

@@ -69,8 +69,6 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     std::vector<std::string> TakeTransfers();
     std::size_t OpenFiles() const;
     std::size_t Running(std::optional<std::uint32_t> place = {}) const;  ///< 0: controls; without one: all
-    /// What all reads of the place brought in together.
-    std::uint64_t BytesIn(std::uint32_t place);
 
     bool LoadEnumeration() override { return true; }
     std::vector<std::string> ListInterfaces(const Protocol::Guid& interfaceClass) override;
@@ -117,7 +115,6 @@ class ScriptedDriver final : public Platform::DeviceFileSystem {
     std::map<std::uint32_t, std::deque<Answer>> scripts_;
     std::map<std::string, std::function<Platform::ErrorCode()>> openActions_;
     std::vector<std::string> transcript_;
-    std::map<std::uint32_t, std::uint64_t> bytesIn_;
     std::uint64_t lastNumber_ = 0;
 };
 

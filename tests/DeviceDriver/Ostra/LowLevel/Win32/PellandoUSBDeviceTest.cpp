@@ -89,31 +89,6 @@ TEST_F(UsbConnection, EndsEachTransferInTimeAndReportsIt) {
     }
 }
 
-TEST_F(UsbConnection, GivesWhatAnInterruptBroughtUntilSomebodySignalsItsEvent) {
-    const OwnedHandle event(MakeAutoResetEvent());
-    USBConnection connection(Path, 3, event.Get());
-    std::atomic<bool> endRequested = false;
-    Bytes buffer(8);
-    const auto read = [&](Answer answer) {
-        driver_.Script(3, std::move(answer));
-        return connection.Read(buffer, endRequested);
-    };
-    EXPECT_EQ(read({.data = Counting(3, 1), .after = clock_.IsVirtual() ? 100'000U : 100U}), 3u);
-    EXPECT_THAT(buffer, ElementsAre(1, 2, 3, 0, 0, 0, 0, 0));
-    EXPECT_EQ(read({.data = Counting(9, 1), .after = 1}), 8u);
-    EXPECT_EQ(read({.code = Errors::DeviceNotConnected, .after = 5}), 0u);
-    EXPECT_EQ(read({.refusal = Errors::AccessDenied}), 0u) << "or it would wait for ever";
-
-    for (const bool arrives : {false, true}) {
-        ClockScheduler().CallAt(ClockScheduler().Now() + 100'000, [&] { SignalEvent(event.Get()); });
-        EXPECT_EQ(
-            read({.data = Counting(2, 1), .after = Never, .cancelledAfter = 3, .cancelledWithData = arrives}),
-            arrives ? 2u : 0u)
-            << "data that arrive during the cancellation count";
-        EXPECT_EQ(driver_.Running(), 0u);
-    }
-}
-
 void ReadOneByte(PellandoUSBDevice& device) {
     std::uint8_t byte = 0;
     device.ReadData(&byte, 1, 0);
