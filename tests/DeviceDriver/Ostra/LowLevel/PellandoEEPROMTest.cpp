@@ -209,13 +209,6 @@ TEST(EepromImages, ValuesThatChangedTheirSizeReadBackRight) {
     EXPECT_FALSE(RoundTrips(Simulator::FreshEeprom(), {{3013, 861}}));
 }
 
-TEST_F(EepromTest, DestructorWritesTheLogUpToAFailure) {
-    Load();
-    instrument_.failingCommand = 3;
-    eeprom_.reset();
-    ExpectCommands("write 0+256 write 256+256 write 512+256 write 768+256");
-}
-
 /// The binary block lies right behind the log, and the table further on.
 TEST_F(EepromTest, LogThatHasGrownBeyondItsAreaIsRefusedAsLongAsItIs) {
     constexpr const char* tooSmall = "Configuration data dump target too small";
