@@ -144,6 +144,8 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
         ForgetEvents();
         const bool isReplaced = code == ExitCode::Success && lines > 0;
         const std::string kept = folder_.Path(isReplaced ? "csv" : "csv.part");
+        const std::string told = " to " + kept + ", and " + folder_.Path("csv") + " is as it was";
+        EXPECT_EQ(tool_.Err().find(told) != std::string::npos, !isReplaced && lines > 0);
         const auto content = lines > 0 ? ReadFile(kept) : std::vector<std::uint8_t>();
         EXPECT_EQ(std::count(content.begin(), content.end(), '\n'), lines);
         EXPECT_EQ(std::filesystem::remove(kept), lines > 0);

@@ -161,47 +161,22 @@ TEST_F(FileTest, AnAtomicFileTakesItsNameWhenItIsComplete) {
     }
 }
 
-TEST_F(FileTest, ARecordingEndsWithWhatIsWorthKeeping) {
-    enum End { Complete, Keep, Discard, Nothing };
-    // What there is in the end: names and content.
-    for (const auto& [end, records, files] : std::vector<std::tuple<End, int, Names>>{
-             {Complete, 0, {"f=head,"}},
-             {Keep, 2, {"f=old", "f.part=head,1,2,"}},
-             {Keep, 0, {"f=old"}},
-             {Discard, 2, {"f=old"}},
-             {Nothing, 1, {"f=old", "f.part=head,1,"}},
-         }) {
-        SCOPED_TRACE(end);
-        std::filesystem::remove(folder_.Path("f.part"));
-        WriteFile(path_, {'o', 'l', 'd'});
-        std::filesystem::permissions(path_, std::filesystem::perms::owner_all);
-        const auto permissions = std::filesystem::status(path_).permissions();
-        RecordOutput::Remains remains;
-        {
-            RecordingFile file(path_, none_);
-            EXPECT_THROW(RecordingFile(path_, none_), FileError) << "two at once";
-            file.Append(std::string("head,"), 0);
-            for (int i = 1; i <= records; ++i) {
-                file.Append(std::to_string(i) + ',', 1);
-            }
-            if (end == Complete) {
-                file.Complete();
-            } else if (end == Keep) {
-                remains = file.KeepWholeRecords();
-            } else if (end == Discard) {
-                file.Discard();
-            }
-        }
-        const bool isKept = end == Keep && records > 0;
-        EXPECT_EQ(remains.file, isKept ? folder_.Path("f.part") : "");
-        EXPECT_EQ(remains.earlier, isKept ? path_ : "");
-        Names found;
-        for (const std::string& name : folder_.Files()) {
-            found.push_back(name + '=' + Content(name));
-        }
-        EXPECT_EQ(found, files);
-        EXPECT_EQ(std::filesystem::status(path_).permissions(), permissions);
-    }
+TEST_F(FileTest, ARecordingIsKeptBesideAnEarlierOneOrReplacesIt) {
+    WriteFile(path_, {'o', 'l', 'd'});
+    std::filesystem::permissions(path_, std::filesystem::perms::owner_all);
+    const auto permissions = std::filesystem::status(path_).permissions();
+    {
+        RecordingFile file(path_, none_);
+        file.Append(std::string("1"), 1);
+    }  // which nobody ended
+    EXPECT_EQ(Content("f"), "old");
+    EXPECT_EQ(Content("f.part"), "1");
+    std::filesystem::remove(folder_.Path("f.part"));
+    RecordingFile file(path_, none_);
+    file.Append(std::string("head"), 0);
+    file.Complete();
+    EXPECT_EQ(Content("f"), "head");
+    EXPECT_EQ(std::filesystem::status(path_).permissions(), permissions);
 }
 
 TEST_F(FileTest, ARecordingLeavesToOthersWhatIsTheirs) {
