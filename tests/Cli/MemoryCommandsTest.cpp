@@ -10,6 +10,7 @@
 #include "Protocol/ByteOrder.h"
 #include "Service/Memory/ImageEdit.h"
 #include "Service/Memory/ImageModel.h"
+#include "Support/Bytes.h"
 #include "ToolFixture.h"
 
 namespace Varnholt::Tests {
@@ -301,7 +302,8 @@ TEST_P(MemoryCommandsTest, CalibrationSetWritesItsValuesOnly) {
 TEST_P(MemoryCommandsTest, ChangesOfAnImageFileNeedNoInstrument) {
     host_.Bus().Unplug("sim");
     WriteFile(image_, before_);
-    WriteFile(folder_.Path("block"), std::vector<std::uint8_t>(1904, 9));
+    const auto block = CountingImage(0, 1904);
+    WriteFile(folder_.Path("block"), block);
     Succeed("calibration set 1211=5 --image @image");
     Succeed("word put 10200=7 10201=0xFFFF0000 --image @image");
     Succeed("binary put @block --image @image");
@@ -310,7 +312,8 @@ TEST_P(MemoryCommandsTest, ChangesOfAnImageFileNeedNoInstrument) {
     Service::SetRawWord(expected, 10200, 7);
     Service::SetRawWord(expected, 10201, 0xFFFF0000);
     Service::SetRawWord(expected, 10203, 0xCAFE);
-    expected = Service::WithBinaryBlock(expected, std::vector<std::uint8_t>(1904, 9));
+    std::copy_n(block.begin(), 984, expected.begin() + 1064);
+    std::copy_n(block.begin() + 984, 920, expected.begin() + 3112);
     EXPECT_EQ(ReadFile(image_), expected);
     EXPECT_EQ(folder_.Files(), (std::vector<std::string>{"block", "image"})) << "no backups of files";
     EXPECT_EQ(JsonOf("word get 10215 10216 --json --image @image")["words"],
