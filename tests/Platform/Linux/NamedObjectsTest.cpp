@@ -21,61 +21,36 @@ std::string NameOfThisTest() {
 /// A mutex and what another process and the test tell each other about it.
 struct Stage {
     bool Acquire() const { return Wait(mutex.Get(), LongTimeout) == WaitResult::Signalled; }
-    bool AwaitReady() const { return Wait(ready.Get(), LongTimeout) == WaitResult::Signalled; }
-    bool AwaitGo() const { return Wait(go.Get(), LongTimeout) == WaitResult::Signalled; }
-    void SayReady() const { ReleaseSemaphore(ready.Get(), 1); }
-    void SayGo() const { ReleaseSemaphore(go.Get(), 1); }
 
     const OwnedHandle mutex{MakeMutex(NameOfThisTest())};
     const OwnedHandle ready{MakeSemaphore(0, 100, NameOfThisTest() + ".ready")};
     const OwnedHandle go{MakeSemaphore(0, 100, NameOfThisTest() + ".go")};
 };
 
-TEST(NamedMutexes, ExcludeOtherProcessesUntilTheLastRelease) {
-    ForkedProcess holder([] {
-        const Stage stage;
-        bool isGood = stage.Acquire() && stage.Acquire();
-        for (int i = 0; i < 2; ++i) {
-            stage.SayReady();
-            isGood = stage.AwaitGo() && ReleaseMutex(stage.mutex.Get()) && isGood;
-        }
-        return isGood ? 0 : 1;
-    });
-    const Stage stage;
-    for (int held = 0; held < 2; ++held) {
-        EXPECT_TRUE(stage.AwaitReady());
-        EXPECT_EQ(Wait(stage.mutex.Get(), 30), WaitResult::TimedOut);
-        EXPECT_FALSE(ReleaseMutex(stage.mutex.Get()));
-        stage.SayGo();
-    }
-    const OwnedHandle event(MakeAutoResetEvent());
-    EXPECT_EQ(Outcome(WaitAny(std::array{event.Get(), stage.mutex.Get()}, LongTimeout)),
-              std::pair(WaitResult::Signalled, std::size_t{1}));
-    EXPECT_EQ(holder.WaitForExit(), 0);
-    EXPECT_TRUE(ReleaseMutex(stage.mutex.Get()));
-}
-
 TEST(NamedMutexes, OfAProcessThatDiedAreAbandoned) {
     for (const bool isKilled : {true, false}) {
         ForkedProcess holder([] {
             static const Stage stage;  // lets nothing go when the process ends
             const bool isGood = stage.Acquire();
-            stage.SayReady();
-            stage.AwaitGo();
+            ReleaseSemaphore(stage.ready.Get(), 1);
+            Wait(stage.go.Get(), LongTimeout);
             return isGood ? 0 : 1;
         });
         const Stage stage;
-        EXPECT_TRUE(stage.AwaitReady());
+        const OwnedHandle event(MakeAutoResetEvent());
+        EXPECT_EQ(Wait(stage.ready.Get(), LongTimeout), WaitResult::Signalled);
+        EXPECT_EQ(Wait(stage.mutex.Get(), 30), WaitResult::TimedOut);
         WaitResult result{};
         TestThread waiting([&] {
-            result = Wait(stage.mutex.Get(), LongTimeout);
+            result = isKilled ? Wait(stage.mutex.Get(), LongTimeout)
+                              : WaitAny(std::array{event.Get(), stage.mutex.Get()}, LongTimeout).result;
             ReleaseMutex(stage.mutex.Get());
         });
         SleepMilliseconds(20);
         if (isKilled) {
             holder.Kill();
         } else {
-            stage.SayGo();
+            ReleaseSemaphore(stage.go.Get(), 1);
             EXPECT_EQ(holder.WaitForExit(), 0);
         }
         waiting.Join();
