@@ -6,7 +6,6 @@
 
 #include <algorithm>
 #include <array>
-#include <cstdlib>
 #include <functional>
 #include <numeric>
 #include <optional>
@@ -21,9 +20,9 @@
 #include "FaultPlan.h"
 #include "FreshEeprom.h"
 #include "ostra.h"
-#include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
 #include "Protocol/Instrument.h"
+#include "Service/Memory/ImageModel.h"
 #include "Support/FaultText.h"
 #include "Support/SimulatedHost.h"
 #include "Support/TestClock.h"
@@ -90,32 +89,15 @@ Outcome ImageWrite() {
     return LastErrorUnless(code == OSTRA_OK);
 }
 
-std::uint32_t WordAt(const Bytes& image, std::uint32_t address) {
-    return Protocol::LoadBig32(&image[address]);
-}
-
-/// The checksum is the first word of a copy and the sum of all others.
-std::uint32_t ChecksumOf(const Bytes& image, std::uint32_t copy) {
-    std::uint32_t sum = 0;
-    for (std::uint32_t at = 4; at < Map::LogSize; at += 4) {
-        sum += WordAt(image, copy + at);
-    }
-    return sum;
-}
-
-bool HasValidLog(const Bytes& image, std::uint32_t copy) {
-    return WordAt(image, copy) == ChecksumOf(image, copy);
-}
-
-/// Both logs filled, and something recognisable where nobody writes.
+/// The log filled, in both copies, and something recognisable where nobody writes.
 Bytes UsedImage() {
-    Bytes image = Simulator::FreshEeprom();
-    for (const std::uint32_t copy : {Map::MainLog, Map::LogCopy}) {
-        for (std::uint32_t at = 4; at < Map::LogSize; at += 4) {
-            Protocol::StoreBig32(&image[copy + at], at * at);
-        }
-        Protocol::StoreBig32(&image[copy], ChecksumOf(image, copy));
-    }
+    Service::ImageModel model(Simulator::FreshEeprom());
+    std::vector<std::int32_t> ramp(128);
+    std::iota(ramp.begin(), ramp.end(), 77'000);
+    model.Get().SetProperty(10010, Property(ramp));
+    model.Get().SetProperty(10011, Property(ramp));
+    model.Get().DumpLog();
+    Bytes image = model.Contents();
     for (std::uint32_t at = Map::BinaryFirst; at < Map::LogCopy; ++at) {
         image[at] = static_cast<std::uint8_t>(at);
     }
@@ -143,8 +125,8 @@ void CheckEeprom(const Bytes& before, const std::vector<Area>& written, const By
         }
     }
     if (!(fault.fromThenOn && ChangesData(fault.kind))) {
-        EXPECT_TRUE(HasValidLog(after, Map::MainLog) || HasValidLog(after, Map::LogCopy))
-            << "no copy of the log is left";
+        const auto log = Service::ReadLogCopies(after);
+        EXPECT_TRUE(log.main.isValid || log.second.isValid) << "no copy of the log is left";
     }
 }
 
