@@ -32,7 +32,7 @@ class HookedDevice final : public Platform::Usb::UsbDevice {
         Complete(transfer, TransferStatus::Cancelled, 0);
     };
     ErrorCode claimAnswer = 0, endpointsAnswer = 0, haltAnswer = 0;
-    bool isGone = false, isClaimed = false;
+    bool isClaimed = false;
     int opened = 0, handles = 0, claims = 0, submissions = 0, cancellations = 0;
     Bytes clearedHalts;  ///< endpoints
     Transfer last;       ///< as it was submitted
@@ -63,14 +63,6 @@ class HookedDevice final : public Platform::Usb::UsbDevice {
             ADD_FAILURE() << "nobody waits for data of endpoint " << int{endpoint};
         }
     }
-    void Unplug() {
-        isGone = true;
-        for (const std::uint8_t endpoint : {Protocol::BulkInEndpoint, Protocol::InterruptInEndpoint}) {
-            while (Transfer* const transfer = Take(endpoint)) {
-                Complete(*transfer, TransferStatus::DeviceGone, 0);
-            }
-        }
-    }
 
     std::vector<Platform::Usb::EndpointInfo> Endpoints(ErrorCode& error) override {
         error = endpointsAnswer;
@@ -80,16 +72,12 @@ class HookedDevice final : public Platform::Usb::UsbDevice {
                                                                      {Protocol::InterruptInEndpoint, 3, 8}};
     }
     ErrorCode Claim() override {
-        const ErrorCode answer = isGone ? Platform::Errors::DeviceNotConnected : claimAnswer;
-        isClaimed = answer == Platform::Errors::Success;
+        isClaimed = claimAnswer == Platform::Errors::Success;
         claims += isClaimed ? 1 : 0;
-        return answer;
+        return claimAnswer;
     }
     void Release() override { isClaimed = false; }
     ErrorCode Submit(Transfer& transfer) override {
-        if (isGone) {
-            return Platform::Errors::DeviceNotConnected;
-        }
         {
             const std::lock_guard lock(mutex_);
             ++submissions;

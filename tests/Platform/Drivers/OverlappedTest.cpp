@@ -16,7 +16,6 @@ namespace {
 
 using namespace Platform;
 
-constexpr std::uint8_t Interrupt = Protocol::InterruptInEndpoint;
 constexpr auto Complete = &HookedDevice::Complete;
 
 /// What holds for every file, whichever driver stands behind it.
@@ -90,7 +89,7 @@ TEST_F(OverlappedFiles, WaitForTheirOwnEndWhereAnEventIsShared) {
         StartPending(pipe_, buffer_, reading);
         StartPending(interruptPipe, interrupt, listening);
         std::thread completer([&] {
-            for (const std::uint8_t endpoint : {Interrupt, In}) {
+            for (const std::uint8_t endpoint : {Protocol::InterruptInEndpoint, In}) {
                 device_->Send(endpoint, {2, 3});
                 if (eventTaken) {
                     Platform::Wait(reading.event.Get(), 1000);

@@ -210,9 +210,16 @@ TEST_F(UsbIoDriver, ADeviceThatIsGoneHasOneCode) {
     const auto in = OpenBound(In);
     Bytes buffer(8);
     Request reading;
+    Transfer* pending = nullptr;
+    device_->onSubmit = [&](Transfer& transfer) {
+        pending = &transfer;
+        return Errors::Success;
+    };
     StartPending(in, buffer, reading);
     bus_.devices.clear();
-    device_->Unplug();
+    device_->onSubmit = [](Transfer&) { return Errors::DeviceNotConnected; };
+    device_->claimAnswer = Errors::DeviceNotConnected;
+    HookedDevice::Complete(*pending, TransferStatus::DeviceGone, 0);
     EXPECT_EQ(Result(in, reading, true), (Outcome{Status::DeviceRemoved, 0}));
     EXPECT_EQ(Read(in, buffer).code, Status::DeviceRemoved);
     EXPECT_EQ(OpenError("usbio/port1"), Errors::FileNotFound);
