@@ -8,7 +8,6 @@
 #include <thread>
 
 #include "Platform/DeviceFiles.h"
-#include "Platform/OverlappedRequest.h"
 #include "Platform/WaitableObjects.h"
 #include "Platform/Win32/Windows.h"
 
@@ -100,21 +99,6 @@ TEST_F(SystemDeviceFilesTest, WaitingForOneResultLeavesTheSignalOfTheOther) {
     EXPECT_EQ(ResultOf(second_, true), Errors::Success);
     sender.join();
     EXPECT_EQ(Wait(event_.Get(), 0), WaitResult::Signalled);
-}
-
-TEST_F(SystemDeviceFilesTest, RequestEndsItsReadBeforeItsBufferGoes) {
-    {
-        std::array<char, 8> buffer{};
-        OverlappedRequest request(event_.Get());
-        request.Start(file_, Operation::Read(buffer.data(), buffer.size()));
-        EXPECT_TRUE(request.IsRunning());
-    }
-    // Nobody is left to take these bytes but the next read.
-    Send("abc");
-    EXPECT_TRUE(
-        SystemDeviceFiles().Start(file_, Operation::Read(firstBuffer_.data(), firstBuffer_.size()), first_));
-    EXPECT_EQ(ResultOf(first_, false), Errors::Success);
-    EXPECT_EQ(std::string(firstBuffer_.data(), moved_), "abc");
 }
 
 }  // namespace
