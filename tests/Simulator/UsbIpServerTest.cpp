@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "Platform/Linux/ForkedProcess.h"
+#include "Platform/UniqueName.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Platform/Usb/SimulatorBus.h"
 #include "Platform/Usb/SystemUsbBus.h"
@@ -57,12 +58,6 @@ class ServerThread final {
         thread_.join();
         close(tasks_[0]);
         close(tasks_[1]);
-    }
-
-    /// A name that no other test has.
-    static std::string UniqueName(const std::string& stem) {
-        static int number = 0;
-        return "test-" + std::to_string(getpid()) + "-" + std::to_string(++number) + "-" + stem;
     }
 
     std::shared_ptr<SimulatedInstrument> Add(const std::string& name, const InstrumentSettings& settings = {},
@@ -136,17 +131,17 @@ class UsbIpServerTest : public testing::Test {
         return infos.empty() ? SimulatorInfo() : infos.front();
     }
 
-    const std::string name_ = ServerThread::UniqueName("a");
+    const std::string name_ = Platform::UniqueName("a");
     ServerThread server_;
 };
 
 TEST_F(UsbIpServerTest, InstrumentsAreListedByNameForAsLongAsTheyAreThere) {
-    const std::string other = ServerThread::UniqueName("b");
+    const std::string other = Platform::UniqueName("b");
     EXPECT_FALSE(Listed(name_));
     server_.Add(other);
     server_.Add(name_);
     std::vector<std::string> names = Platform::Usb::SystemUsbBus().List();
-    std::erase_if(names, [](const std::string& each) { return !each.starts_with("simulated-test-"); });
+    std::erase_if(names, [](const std::string& each) { return !each.starts_with("simulated-ostra-test-"); });
     EXPECT_EQ((std::vector<std::string>{"simulated-" + name_, "simulated-" + other}), names);
     for (const std::string& refused : {name_, std::string("a/b"), std::string(), std::string(65, 'x')}) {
         EXPECT_THROW(server_.Add(refused), std::runtime_error) << refused;
