@@ -14,8 +14,6 @@ namespace {
 
 using namespace Protocol;
 using namespace Protocol::UsbIoDriver;
-using testing::ElementsAre;
-using testing::IsEmpty;
 using namespace Tests;
 
 TEST(CUsbIoErrorText, EveryStatusHasTheTextOfTheDocumentedTable) {

@@ -12,7 +12,6 @@ namespace {
 
 using namespace Protocol::UsbIoDriver;
 using namespace Protocol;
-using testing::ElementsAreArray;
 using namespace Tests;
 
 constexpr std::uint32_t Limit = 10000;

@@ -2,7 +2,6 @@
 // the instrument's own driver, on 64-bit Windows over the USBIO driver.
 #include <gmock/gmock.h>
 
-#include <algorithm>
 #include <array>
 #include <atomic>
 #include <fstream>
