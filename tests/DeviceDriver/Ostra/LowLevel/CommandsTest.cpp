@@ -280,13 +280,13 @@ TEST_P(Commands, ScanAtRaisedPriorityAndGiveItBack) {
 
 TEST_P(Commands, PassMessagesOnUntilTheListenerIsRemoved) {
     PellandoFunctionality& instrument = Open();
+    listener_.onMessage = [&](std::uint32_t) { instrument.removeListener(&listener_); };
     for (const bool isRemoved : {false, true}) {
         SleepMilliseconds(50);  // an interrupt just after the opening is thrown away
         EXPECT_TRUE(driver_.Complete(Interrupts(), Answer{.data = {1}}));
         SleepMilliseconds(50);
         EXPECT_THAT(listener_.Codes(), ElementsAre(MessageButtonData)) << isRemoved;
         EXPECT_NO_THROW(instrument.SetMeasureMode(1)) << "only the end of the instrument closes its pipes";
-        instrument.removeListener(&listener_);
     }
 }
 
