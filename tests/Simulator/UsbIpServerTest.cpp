@@ -170,8 +170,7 @@ TEST_F(UsbIpServerTest, DataTravelBothWaysWhole) {
     constexpr std::uint32_t piece = 1U << 20U;
     const InstrumentSettings settings{.scanBytes = 3 * piece + 1000};
     const auto instrument = server_.Add(name_, settings);
-    const auto device = Open(name_);
-    ASSERT_EQ(Errors::Success, device->Claim());
+    const auto device = OpenAndClaim(name_);
     Platform::ErrorCode error = Errors::Busy;
     const auto endpoints = device->Endpoints(error);
     EXPECT_EQ(Errors::Success, error);
