@@ -212,9 +212,17 @@ TEST_F(UsbIpDeviceTest, SilentPeerDoesNotHoldUpACancellation) {
     EXPECT_LT(Clock::now() - start, std::chrono::seconds(3));
 }
 
-TEST_F(UsbIpDeviceTest, PeerThatDoesNotReadDoesNotHoldUpASubmission) {
+TEST_F(UsbIpDeviceTest, PeerMayReadSlowlyButHoldsUpNoSubmissionForEver) {
+    constexpr std::size_t size = 4U << 20;
     const auto device = MakeClaimedDevice();
-    TestTransfer large = TestTransfer::Out(BulkOutEndpoint, Bytes(4U << 20));
+    TestTransfer taken = TestTransfer::Out(BulkOutEndpoint, Bytes(size));
+    std::jthread peerThread([this] {
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+        EXPECT_EQ(48 + size, PeerReceives(48 + size).size());
+    });
+    ASSERT_EQ(Errors::Success, device->Submit(taken));
+    peerThread.join();
+    TestTransfer large = TestTransfer::Out(BulkOutEndpoint, Bytes(size));
     const auto start = Clock::now();
     ASSERT_EQ(Errors::Success, device->Submit(large));
     ASSERT_TRUE(large.Wait());
