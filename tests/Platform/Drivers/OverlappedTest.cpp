@@ -59,6 +59,26 @@ TEST_F(OverlappedFiles, RequestsEndBeforeTheyStartAnew) {
     EXPECT_EQ(std::pair(moved, other[0]), std::pair(1U, std::uint8_t{7}));
 }
 
+TEST_F(OverlappedFiles, ARequestThatHasFailedEndsWithoutCancellingOthers) {
+    const ScopedDeviceFiles inForce(*files_);
+    OverlappedRequest going(request_.event.Get());
+    Bytes other(8);
+    {
+        const Request record;
+        OverlappedRequest failed(record.event.Get());
+        Transfer* transfer = nullptr;
+        device_->onSubmit = [&](Transfer& submitted) {
+            transfer = &submitted;
+            return Errors::Success;
+        };
+        failed.Start(pipe_, Operation::Read(buffer_.data(), 8));
+        device_->onSubmit = {};
+        going.Start(pipe_, Operation::Read(other.data(), 8));
+        Complete(*transfer, TransferStatus::Stalled, 0);
+    }
+    EXPECT_EQ(device_->cancellations, 0);
+}
+
 // Without an event of the record, and where none can be had.
 TEST_F(OverlappedFiles, WaitWithoutAnEvent) {
     Request bare;
