@@ -62,8 +62,12 @@ class ServerThread final {
 
     std::shared_ptr<SimulatedInstrument> Add(const std::string& name, const InstrumentSettings& settings = {},
                                              const std::string& faults = "") {
-        auto instrument = std::make_shared<SimulatedInstrument>(loop_, settings);
-        Do([&] { server_->Add({name, instrument, FaultPlan::Parse(faults), {}}); });
+        std::shared_ptr<SimulatedInstrument> instrument;
+        Do([&] {  // also its end, where it is refused, is the loop's
+            auto made = std::make_shared<SimulatedInstrument>(loop_, settings);
+            server_->Add({name, made, FaultPlan::Parse(faults), {}});
+            instrument = std::move(made);
+        });
         return instrument;
     }
 
