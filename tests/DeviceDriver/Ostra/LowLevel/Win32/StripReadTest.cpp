@@ -1,4 +1,3 @@
-
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
 #include "Platform/CallFilter.h"
 #include "Platform/Time.h"
