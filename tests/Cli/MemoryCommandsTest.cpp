@@ -410,7 +410,8 @@ TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
 
 TEST_P(RamTest, RefusesWhatCannotBeSet) {
     host_.Add("sim");
-    for (const char* assignment : {"2012=1", "2021=1", "2005=1", "1211=1", "2009=x", "2010=1,2", "2009"}) {
+    for (const char* assignment : {"2004=1", "2006=1", "2012=1", "2013=1", "2016=1", "2017=1", "2020=1",
+                                   "2021=1", "2005=1", "1211=1", "2009=x", "2010=1,2", "2009"}) {
         Fail(std::string("ram set ") + assignment, ExitCode::Usage);
     }
     for (const char* assignment :

@@ -96,6 +96,14 @@ TEST_P(ScanTest, OtherRecordSizes) {
     }
 }
 
+#if !defined(_WIN32)
+/// What cannot be written is not taken for data that did not come.
+TEST_P(ScanTest, ToAFullDisk) {
+    host_.Add("sim", Streaming(100'000));
+    Fail("scan --raw --record-size 1000 --total 100000 --output /dev/full", ExitCode::File, "/dev/full");
+}
+#endif
+
 TEST_P(ScanTest, ProgressOnATerminalAndASummary) {
     tool_.errFacts.isTerminal = tool_.errFacts.movesCursor = true;
     host_.Add("sim", Streaming(1'000'000));

@@ -3,6 +3,7 @@
 #include <array>
 #include <chrono>
 #include <ctime>
+#include <limits>
 
 #include "EachClock.h"
 #include "Platform/EventScheduler.h"
@@ -46,6 +47,11 @@ TEST(WallClock, AndItsCalendarAreTheSystems) {
             (std::array{expected->tm_year + 1900, expected->tm_mon + 1, expected->tm_mday, expected->tm_hour,
                         expected->tm_min, expected->tm_sec}));
     }
+#if !defined(_WIN32)
+    const CalendarTime beyond = LocalCalendarTime(std::numeric_limits<std::int64_t>::max());
+    EXPECT_EQ((std::array{beyond.year, beyond.month, beyond.day, beyond.hour, beyond.minute, beyond.second}),
+              (std::array{1970, 1, 1, 0, 0, 0}));
+#endif
 }
 
 }  // namespace

@@ -23,6 +23,7 @@ class EventReaders : public testing::Test {
 };
 
 TEST_F(EventReaders, TakeWhatComesWhileTheyLive) {
+    Platform::SleepMilliseconds(50);  // their time begins with them
     std::optional<EventReader> first(std::in_place, mailbox_, instrument_);
     first.emplace(mailbox_, instrument_);  // at the same place: what is left of the one before shows
     EventReader second(mailbox_, instrument_);

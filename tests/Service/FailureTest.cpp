@@ -81,6 +81,7 @@ TEST(InstrumentNamesTest, ShortNames) {
     EXPECT_EQ(ShortNameOf(R"(\\?\usb#vid_1209&pid_0001#SIM0001#{00873fdf-61a8-11d1-aa5e-00c04fb1728b})"),
               "SIM0001");
     EXPECT_EQ(ShortNameOf(R"(\\?\odd)"), R"(\\?\odd)");
+    EXPECT_EQ(ShortNameOf(R"(\\?\usb##{class})"), "");
     EXPECT_EQ(ShortNameOf(""), "");
 }
 

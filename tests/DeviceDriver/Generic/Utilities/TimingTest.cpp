@@ -24,6 +24,9 @@ TEST(PrecisionTime, CarriesAndBorrowsOnceAndCompares) {
     EXPECT_EQ(PrecisionTime(1, 400000) + PrecisionTime(2, 599999), PrecisionTime(3, 999999));
     EXPECT_EQ(PrecisionTime(3, 200000) - PrecisionTime(1, 200000), PrecisionTime(2, 0));
     EXPECT_EQ(PrecisionTime(1, 0) - PrecisionTime(2, 1), PrecisionTime(-2, 999999));
+    PrecisionTime assigned;
+    assigned = PrecisionTime(2, 5);
+    EXPECT_EQ(assigned, PrecisionTime(2, 5));
     EXPECT_EQ(PrecisionTime(2, 123456).GetMilliseconds(), 123);
     EXPECT_EQ(PrecisionTime(2, 123456).GetMicroseconds(), 456);
     EXPECT_TRUE(PrecisionTime(5, 999999) < PrecisionTime(6, 0) && PrecisionTime(-1, 0) < PrecisionTime(0, 0));
