@@ -193,6 +193,14 @@ TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
         device->Release();
         EXPECT_EQ(Errors::Success, device->Claim()) << "a new connection";
     }
+    for (const std::uint32_t sequence : {0U, 1000U}) {  // of a cancellation that nobody sent
+        const auto device = MakeClaimedDevice();
+        TestTransfer transfer = TestTransfer::In(BulkInEndpoint, 64);
+        ASSERT_EQ(Errors::Success, device->Submit(transfer));
+        PeerSends(UsbIp::Encode(UsbIp::UnlinkReply{sequence, -104}));
+        ASSERT_TRUE(transfer.Wait()) << sequence;
+        EXPECT_EQ(TransferStatus::DeviceGone, transfer.status) << sequence;
+    }
 }
 
 TEST_F(UsbIpDeviceTest, SilentPeerDoesNotHoldUpACancellation) {
