@@ -310,6 +310,9 @@ TEST_P(InstrumentCommandsTest, VerboseTellsWhatIsSent) {
     SetFaults("bulk-in 0:stall");
     Fail("-v readout", ExitCode::InputOutput, Identifier() + ": ");
     EXPECT_THAT(told(), HasSubstr("\nostra: bulk in 0 of 256: failed with code 0x"));
+    SetFaults("control 1:stall");
+    Fail("-v readout", ExitCode::InputOutput, Identifier() + ": ");
+    EXPECT_THAT(told(), HasSubstr("SetMeasureParameters p1=294 p2=0 p3=1 p4=6: failed with code 0x"));
     SetFaults("bulk-in 0:short=60");
     Fail("readout", ExitCode::InputOutput, "60 of 256 bytes came");
     SetFaults("control 1+:short=3");
