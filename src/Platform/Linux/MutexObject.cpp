@@ -110,7 +110,6 @@ ErrorCode MutexObject::Release(ThreadRecord& releaser) {
 
 void MutexObject::Abandon() {
     owner_ = nullptr;
-    depth_ = 0;
     LetGo(true);
     OfferToWaiters();
 }

@@ -136,7 +136,7 @@ class DriverFixture : public testing::Test {
     Outcome Result(Platform::Handle file, Request& request, bool wait = false) {
         std::uint32_t bytes = 0xDEAD;
         const bool succeeded = files_->GetResult(file, request.record, bytes, wait);
-        return {succeeded ? Platform::Errors::Success : Platform::LastError(), bytes};
+        return {Platform::ErrorOf(succeeded), bytes};
     }
 
     HookedBus bus_;

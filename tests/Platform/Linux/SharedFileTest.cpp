@@ -1,6 +1,7 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/file.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -57,10 +58,23 @@ TEST_F(SharedFiles, AreTheUsersOwnAndGoWithTheLastHandle) {
     ASSERT_EQ(stat(path_.c_str(), &state), 0);
     EXPECT_EQ(state.st_mode & 0777, 0600u);
     EXPECT_EQ(state.st_uid, geteuid());
+    const std::string directory = UserDirectory::Open()->Path();
+    std::error_code ignored;
+    for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
+        if (std::filesystem::read_symlink(entry, ignored).string().starts_with(directory)) {
+            EXPECT_EQ(fcntl(std::stoi(entry.path().filename()), F_GETFD), FD_CLOEXEC)
+                << "no child's business";
+        }
+    }
     first.Reset();
     EXPECT_TRUE(std::filesystem::exists(path_));
     second.Reset();
     EXPECT_FALSE(std::filesystem::exists(path_));
+    first = OwnedHandle(MakeMutex(name_));
+    std::filesystem::remove(path_);
+    std::ofstream{path_};
+    first.Reset();
+    EXPECT_TRUE(std::filesystem::exists(path_)) << "it is another's now";
 }
 
 TEST_F(SharedFiles, WithOtherContentAreReplacedUnlessInUse) {
@@ -121,7 +135,7 @@ TEST(SharedFileNames, AreFileNamesOfBoundedLengthAndDiffer) {
         EXPECT_LE(fileName.size(), 200u);
         EXPECT_TRUE(fileNames.insert(fileName).second) << fileName;
     }
-    EXPECT_NE(SharedFile::FileNameOf("mutex", "a"), SharedFile::FileNameOf("semaphore", "a"));
+    EXPECT_EQ(SharedFile::FileNameOf("semaphore", "azAZ09_-`{@[/:"), "semaphore.azAZ09_-%60%7B%40%5B%2F%3A");
 }
 
 /// Stands for the machine's shared memory.
@@ -161,6 +175,12 @@ TEST_F(UserDirectories, SayWhyTheyCannotBeHad) {
     std::ofstream{above_ + "/file"};
     EXPECT_EQ(ErrorOf(UserDirectory::Open(above_ + "/nothing") != nullptr), Errors::FileNotFound);
     EXPECT_EQ(ErrorOf(UserDirectory::Open(above_ + "/file") != nullptr), Errors::PathNotFound);
+    ForkedProcess withoutFiles([this] {
+        const rlimit none{};
+        setrlimit(RLIMIT_NOFILE, &none);
+        return ErrorOf(UserDirectory::Open(above_) != nullptr) == Errors::NoSystemResources ? 0 : 1;
+    });
+    EXPECT_EQ(withoutFiles.WaitForExit(), 0);
 }
 
 }  // namespace

@@ -284,13 +284,21 @@ TEST_F(UsbIpDeviceTest, EndpointsOfADeviceThatDoesNotAnswerAreNotAnEmptyList) {
     EXPECT_EQ(Errors::DeviceNotConnected, error);
 }
 
-TEST(UsbIpSocketTest, PeerThatGoesOnSendingDoesNotOutlastTheLimit) {
+TEST(UsbIpSocketTest, KeepsWhatIsNotTakenAndNoPeerOutlastsTheLimit) {
     int files[2] = {-1, -1};
     ASSERT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, files));
     UsbIpSocket socket(files[0]);
-    Bytes bytes(3);
-    EXPECT_EQ(2, send(files[1], bytes.data(), 2, 0));
-    EXPECT_TRUE(socket.Receive(std::span(bytes).first(1), false));
+    const Bytes sent = Counting(6, 1);
+    EXPECT_EQ(6, send(files[1], sent.data(), 6, 0));
+    Bytes bytes(8);
+    for (const std::size_t taken : {1U, 3U}) {
+        EXPECT_TRUE(socket.Receive(std::span(bytes).subspan(0, taken), false));
+    }
+    EXPECT_EQ((Bytes{2, 3, 4}), Bytes(bytes.begin(), bytes.begin() + 3));
+    EXPECT_EQ(2, send(files[1], sent.data(), 2, 0));
+    bytes.resize(3);
+    EXPECT_TRUE(socket.Receive(bytes, false));
+    EXPECT_EQ((Bytes{5, 6, 1}), bytes) << "what is left, and what came later";
     socket.ReceiveUntil(Clock::now() - std::chrono::seconds(1));
     EXPECT_EQ(3, send(files[1], bytes.data(), 3, 0));
     EXPECT_FALSE(socket.Receive(bytes, false));
