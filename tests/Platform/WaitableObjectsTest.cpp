@@ -100,11 +100,10 @@ TEST_P(Waits, LastAsLongAsTheirTimeout) {
 }
 
 TEST_P(Waits, RefuseWhatIsNoHandleOrNamesAnotherKindOfObject) {
-    OwnedHandle closed(MakeAutoResetEvent());
+    const Handle gone = MakeAutoResetEvent();
+    EXPECT_TRUE(Close(gone));
     const OwnedHandle event(MakeAutoResetEvent());
     const OwnedHandle mutex(MakeMutex(""));
-    const Handle gone = closed.Get();
-    closed.Reset();
     const auto expectInvalid = [](bool isFailure) { EXPECT_EQ(ErrorOf(!isFailure), Errors::InvalidHandle); };
     for (const Handle handle : {NoHandle, InvalidHandle(), gone}) {
         expectInvalid(Wait(handle, 0) == WaitResult::Failed);
