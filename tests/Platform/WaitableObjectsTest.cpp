@@ -101,9 +101,9 @@ TEST_P(Waits, LastAsLongAsTheirTimeout) {
 
 TEST_P(Waits, RefuseWhatIsNoHandleOrNamesAnotherKindOfObject) {
     const Handle gone = MakeAutoResetEvent();
-    EXPECT_TRUE(Close(gone));
     const OwnedHandle event(MakeAutoResetEvent());
     const OwnedHandle mutex(MakeMutex(""));
+    EXPECT_TRUE(Close(gone));  // last, so that neither is given its number
     const auto expectInvalid = [](bool isFailure) { EXPECT_EQ(ErrorOf(!isFailure), Errors::InvalidHandle); };
     for (const Handle handle : {NoHandle, InvalidHandle(), gone}) {
         expectInvalid(Wait(handle, 0) == WaitResult::Failed);
