@@ -51,7 +51,6 @@ std::uint32_t CUsbIo::Open(int deviceNumber, const Platform::DeviceList& list,
     std::string path;
     if (list) {
         if (const std::uint32_t status = ReadDetail(deviceNumber, list, interfaceGuid)) {
-            DetailData.reset();
             return status;
         }
         path = GetDevicePathName();

@@ -3,6 +3,7 @@
 #include <functional>
 
 #include "DeviceDriver/Generic/Configuration/Properties.h"
+#include "DeviceDriver/Generic/Utilities/EndianConversion.h"
 #include "Support/ExpectThrow.h"
 #include "Utilities/Exceptions/Exceptions.h"
 
@@ -43,6 +44,12 @@ TEST(Property, HoldsWhatItWasGivenWhateverWasThere) {
     ExpectHeld("integers", Longs{1, -1}, TypeLongVector, {1, -1}, {}, {0, 0, 0, 1, 255, 255, 255, 255});
     ExpectHeld("floats", Floats{-2.0F}, TypeFloatVector, {}, {-2.0F}, {0xC0, 0, 0, 0});
     ExpectHeld("no integers", Longs{}, TypeLongVector, {}, {}, {});
+}
+
+TEST(EndianConversion, TakesSignedShorts) {
+    Bytes bytes(2);
+    Utilities::EndianConversion::ShortToByteArray(std::int16_t{-2}, bytes.data(), true);
+    EXPECT_EQ(bytes, (Bytes{0xFF, 0xFE}));
 }
 
 TEST(Property, BytesRefillTheValueAndKeepTheType) {

@@ -167,13 +167,34 @@ TEST_P(Commands, MoveMemoryInPiecesThatTheWireCanCarry) {
         ExpectOnTheWire(wire);
     }
     Bytes nothing, tooMuch(0x10000);
-    EXPECT_THROW(instrument.ReadEEPROM(0, nothing), InvalidArgumentException);
-    EXPECT_THROW(instrument.ReadEEPROM(0, tooMuch), InvalidArgumentException);
-    EXPECT_THROW(instrument.DownloadFirmware(0, nothing, true), InvalidArgumentException);
-    EXPECT_THROW(instrument.DownloadFirmware(0, tooMuch, false), InvalidArgumentException);
+    for (Bytes* const refused : {&nothing, &tooMuch}) {
+        const std::string text = "data of 1 to 65535 bytes expected";
+        ExpectThrow<InvalidArgumentException>(text, [&] { instrument.ReadEEPROM(0, *refused); });
+        ExpectThrow<InvalidArgumentException>(text, [&] { instrument.DownloadFirmware(0, *refused, true); });
+    }
     EXPECT_THAT(TakeTransfers(), IsEmpty());
     EXPECT_NO_THROW(instrument.DownloadFirmware(0, Bytes(0xFFFF), false));
     EXPECT_THROW(PellandoFunctionality{Pointer()}, NullPointerException);
+}
+
+TEST_P(Commands, CanBeMadeToRefuseDataThatAreNotWhole) {
+    PellandoFunctionality& instrument = Open();
+    const std::function<void()> set = [&] { instrument.SetMeasureParameters(1, 2, 3, 4); };
+    const std::function<void()> get = [&] { instrument.GetMeasureParameters(a, b, c, m[0], m[1]); };
+    for (const bool isRequired : {false, true}) {
+        for (const auto* const command : {&set, &get}) {
+            for (const std::uint32_t moved : {0U, 1U, 7U, 8U, 9U}) {
+                SCOPED_TRACE(moved);
+                driver_.Script(0, {.count = moved});
+                // The native driver need not say how much it sent.
+                const bool isUnknown = IsNative() && command == &set && moved == 0;
+                isRequired&& moved != 8 && !isUnknown
+                    ? ExpectThrow<IOException>(std::to_string(moved) + " of 8 bytes came", *command)
+                    : (*command)();
+            }
+        }
+        transport_->RequireWholeData();
+    }
 }
 
 /// The native driver's record keeps its bytes from one command to the next, and so they are sent.
@@ -275,6 +296,7 @@ TEST_P(Commands, ScanAtRaisedPriorityAndGiveItBack) {
         In(), {.data = Counting(5, 1), .after = 1, .onStart = [&] { during = CurrentThreadPriority(); }});
     instrument.StartScan(5, 1, IsNative() ? 5 : 1000);
     EXPECT_EQ(during, raised);
+    EXPECT_EQ(TakeTransfers().front(), OnTheWire(IsNative(), "C0@0").front());
     EXPECT_EQ(CurrentThreadPriority(), before);
 }
 

@@ -91,8 +91,6 @@ TEST_F(EepromTest, LoadFillsSetsByNameOrByIdentifier) {
         EXPECT_EQ(named.GetPropertyKeys().front(), first);
         EXPECT_EQ(named.GetPropertyKeys().back(), last);
     }
-    Properties other("calibrationdata");
-    EXPECT_EQ(eeprom_->Load(other).GetItemCount(), 0U);
     Properties some("CalibrationData");
     some.SetProperty(2005, Property(7));
     some.SetProperty(3009, Property());

@@ -50,9 +50,12 @@ class InterruptListener::Watch final : public InterruptWatch {
             std::make_shared<USBConnection>(devicePath_, Protocol::NativeDriver::InterruptPipe, Wake());
         ExchangePipe(connection);
         ReportStart();
-        for (std::uint32_t count = 1; count != 0 && !EndRequested();) {
-            count = connection->Read(buffer, EndRequested());
+        while (!EndRequested()) {
+            const std::uint32_t count = connection->Read(buffer, EndRequested());
             DispatchEvent(count);
+            if (count == 0) {
+                break;
+            }
         }
     }
     std::shared_ptr<USBConnection> ExchangePipe(std::shared_ptr<USBConnection> connection) {
