@@ -15,12 +15,11 @@ using Varnholt::Utilities::Exceptions::RuntimeException;
 /// Text of the most recent failure.
 std::string lastError;  // NOLINT: an empty string's constructor does not throw
 
-/// Stores the text of a failure. Where there is no memory even for the text, an empty one has to do.
+/// Stores the text of a failure in the place of an empty one.
 void SetLastError(const char* text) noexcept {
     try {
         lastError = text;
-    } catch (...) {
-        lastError.clear();
+    } catch (...) {  // no memory even for the text: the empty one has to do
     }
 }
 

@@ -1,6 +1,7 @@
 #include "UsbIo/CUsbIoThread.h"
 
-#include <cstring>
+#include <algorithm>
+#include <cstdint>
 #include <mutex>
 #include <utility>
 
@@ -24,9 +25,7 @@ void CUsbIoThread::FreeBuffers() {
 void CUsbIoThread::OnBufferCompleted(CUsbIoBuffer&) {}
 
 void CUsbIoThread::PrepareBuffer(CUsbIoBuffer& buffer) {
-    if (buffer.Size > 0) {
-        std::memset(buffer.Buffer, 0, buffer.Size);
-    }
+    std::fill_n(static_cast<std::uint8_t*>(buffer.Buffer), buffer.Size, std::uint8_t{0});
     buffer.NumberOfBytesToTransfer = buffer.Size;
     buffer.BytesTransferred = 0;
 }

@@ -123,10 +123,14 @@ TEST_F(CUsbIoThreadTest, ReadsAStreamInOrder) {
         expected.insert(expected.end(), data.begin(), data.end());
     }
     reader_.readsWanted = 10;
+    reader_.ThreadPriority = -1;
+    std::atomic<int> priority = 0;
+    reader_.onCompleted = [&] { priority = Platform::CurrentThreadPriority(); };
     Start(3);
     EXPECT_FALSE(reader_.StartThread());
     EXPECT_TRUE(reader_.WaitForExit());
     EXPECT_THAT(reader_.Received(), ElementsAreArray(expected));
+    EXPECT_EQ(priority, -1);
     ExpectEnd(3);
 }
 

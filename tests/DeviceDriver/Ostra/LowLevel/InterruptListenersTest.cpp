@@ -82,7 +82,6 @@ TYPED_TEST(InterruptListeners, TurnReadsIntoMessages) {
     enum On { Both, Native, UsbIo };
     const std::uint32_t late = this->clock_.IsVirtual() ? 15'000 : 100;
     const std::vector<std::tuple<const char*, On, std::vector<Answer>, Codes, bool>> cases{
-        {"gone", Both, {Gone}, {MessageDeviceGone}, false},
         {"refused", Both, {{.refusal = Errors::AccessDenied}}, {MessageDeviceGone}, false},
         {"pressed twice", Both, {Press, Press, Gone}, {Button, Button, MessageDeviceGone}, true},
         {"nothing", Native, {{.after = 5}}, {MessageDeviceGone}, false},

@@ -90,7 +90,6 @@ const StripCase StripCases[] = {
     {"ends with an empty first transfer", 5, 0, {Data(0)}, "10 50 50 x", 0},
     // The buffers go with the operation: a read that was still running would write into freed memory.
     {"ends with the reads that it cancels", 5, 0, {Data(5), Slow, Slow}, "10 50 50 x", 5, "", 30},
-    {"goes on after two records", 5, 0, {Data(10), Data(45)}, "10 50 50 50 x", 55},
     {"late", 5, 0, {Data(10, 3999), Data(50, 7998), Data(5, 7998)}, "10 50 50 50 50 x", 65, "", 11997},
     {"fails when the first is late", 5, 0, {}, "10 50 x", 0, Failed, Limit},
     {"keeps the records before a failure", 5, 0, {Data(10)}, "10 50 50 x", 10, Failed, Limit},
@@ -100,14 +99,12 @@ const StripCase StripCases[] = {
     {"refuses more than was asked", 5, 0, {Data(10), TooLong}, "10 50 50 x", 10, WrongSize},
     {"largest record", 6553, 0, {Data(6553)}, "13106 65530 65530 x", 6553},
     {"too large a record", 6554, 0, {}, "", 0, TooLarge},
-    {"record size that wraps", 0x1999999A, 0, {}, "", 0, TooLarge},
     {"empty records", 0, 0, {}, "", 0, Empty},
 
     {"counted", 5, 120, {Data(50), Data(50), Data(20)}, "50 50 20", 120},
     {"counted, not whole records", 5, 23, {Data(23)}, "23", 20},
     // The completions of the two outstanding reads share one signal. Whatever their order, no read may be
     // waited for longer than it runs, nor be given up before its time.
-    {"counted, in order", 5, 100, {Data(50, 10), Data(50, 20)}, "50 50", 100, "", 20},
     {"counted, the second first", 5, 100, {Data(50, 500), Data(50, 20)}, "50 50", 100, "", 500},
     {"counted, in the last moment", 5, 100, {Data(50, 3999), Data(50, 3998)}, "50 50", 100, "", 3999},
     {"counted, 2nd alone", 5, 100, {Stuck, Data(50, 3000)}, "50 50 x", 0, BusyFailed(0, 50, 0), Limit + 5},
