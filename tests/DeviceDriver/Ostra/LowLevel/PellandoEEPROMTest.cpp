@@ -193,15 +193,8 @@ TEST_F(EepromTest, DumpOfAFreshInstrumentIsTheFreshImage) {
 
 TEST(EepromImages, ValuesThatChangedTheirSizeReadBackRight) {
     // In the middle, at the end and at the beginning; shorter, empty and as long as fits; and of the log.
-    for (const Resize& resize : {Resize{3009, 3},
-                                 {3013, 2},
-                                 {1000, 40},
-                                 {1002, 1},
-                                 {3011, 0},
-                                 {3013, 860},
-                                 {10011, 130},
-                                 {10021, 2},
-                                 {10010, 2}}) {
+    for (const Resize& resize :
+         {Resize{3009, 3}, {1000, 40}, {3011, 0}, {3013, 860}, {10011, 130}, {10021, 2}, {10010, 2}}) {
         EXPECT_TRUE(RoundTrips(Simulator::FreshEeprom(), {resize})) << resize.id;
     }
     EXPECT_FALSE(RoundTrips(Simulator::FreshEeprom(), {{3013, 861}}));

@@ -255,9 +255,7 @@ void PellandoUSBDevice::ReadStrip(ScanReceiver& receiver, PartialData partialDat
         return size;
     };
     std::uint32_t current = start(total ? chunk : RecordsOfFirstRead * recordSize);
-    if (current > 0) {
-        reader.Advance();
-    }
+    reader.Advance();
     for (bool isFirst = true;; isFirst = false) {
         const std::uint32_t next = start(chunk);
         receiver.Receive(reader.Arrived());

@@ -63,7 +63,6 @@ void StripReader::Advance() {
     std::swap(arrived_, waiting_->buffer);
     arrivedCount_ = succeeded_ ? count_ : 0;
     std::swap(waiting_, following_);
-    succeeded_ = false;
     count_ = 0;
 }
 

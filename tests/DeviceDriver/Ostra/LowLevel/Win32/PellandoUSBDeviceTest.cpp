@@ -155,6 +155,16 @@ TEST_F(NativeDevice, ClosesItsPipesWhenTheInstrumentIsGone) {
     EXPECT_THAT(driver_.TakeTranscript(), IsEmpty());
 }
 
+TEST_F(NativeDevice, DoesNotTellThatTheInstrumentHasGoneOnceItIsBeingClosed) {
+    auto device = Open();
+    driver_.Script(0, {.onStart = [&] {
+                       driver_.Complete(InterruptPipe, Answer{.code = Errors::DeviceNotConnected});
+                       SleepMilliseconds(10);
+                   }});
+    device.reset();
+    EXPECT_THAT(listener_.Codes(), IsEmpty());
+}
+
 /// Whoever holds the mutex named after the path keeps every transfer of every device of that path waiting.
 TEST_F(NativeDevice, TakesTheDeviceLockForEveryTransfer) {
     auto device = Open();

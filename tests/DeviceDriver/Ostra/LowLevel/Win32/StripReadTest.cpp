@@ -90,7 +90,6 @@ const StripCase StripCases[] = {
     {"ends with an empty first transfer", 5, 0, {Data(0)}, "10 50 50 x", 0},
     // The buffers go with the operation: a read that was still running would write into freed memory.
     {"ends with the reads that it cancels", 5, 0, {Data(5), Slow, Slow}, "10 50 50 x", 5, "", 30},
-    {"late", 5, 0, {Data(10, 3999), Data(50, 7998), Data(5, 7998)}, "10 50 50 50 50 x", 65, "", 11997},
     {"fails when the first is late", 5, 0, {}, "10 50 x", 0, Failed, Limit},
     {"keeps the records before a failure", 5, 0, {Data(10)}, "10 50 50 x", 10, Failed, Limit},
     {"fails with a transfer", 5, 0, {Data(10), GoneAtOnce}, "10 50 50 x", 10, Failed},
