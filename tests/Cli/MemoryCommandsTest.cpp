@@ -124,12 +124,15 @@ TEST_P(MemoryCommandsTest, WriteMakesABackupThatRestores) {
 TEST_P(MemoryCommandsTest, BackupsGetANameOfTheirOwn) {
     const auto previous = std::filesystem::current_path();
     std::filesystem::current_path(folder_.Path(""));
+    host_.Bus().Unplug("sim");
+    auto& odd = host_.Add("09:@AZ[`az{-.");  // the neighbours of what stays
     for (const EepromImage& content : {before_, Calibrated("5")}) {
-        instrument_.SetEeprom(content);
-        const std::string name = JsonOf("calibration set 1211=6 --json")["backup"];
-        const std::regex form("ostra-sim-5a0123456789abcd-\\d{8}-\\d{6}(-2)?\\.eeprom");
+        odd.SetEeprom(content);
+        const std::string name = JsonOf("calibration set 1211=6 1000=0.5,-2 --json")["backup"];
+        const std::regex form("ostra-09__AZ__az_-\\.-5a0123456789abcd-\\d{8}-\\d{6}(-2)?\\.eeprom");
         EXPECT_TRUE(std::regex_match(name, form)) << name;
         EXPECT_EQ(ReadFile(folder_.Path(name)), content);
+        EXPECT_EQ(odd.Eeprom(), Service::WithCalibration(content, {{1211, "6"}, {1000, "0.5,-2"}}).image);
     }
 #if !defined(_WIN32)
     std::filesystem::create_directory("gone");
@@ -285,20 +288,6 @@ TEST_P(MemoryCommandsTest, CtrlCEndsAWriteBetweenTwoPieces) {
     EXPECT_EQ(instrument_.Eeprom(), expected);
 }
 
-TEST_P(MemoryCommandsTest, CalibrationSetWritesItsValuesOnly) {
-    Succeed("calibration set 1211=0x01020304 1000=0.5,-2 --backup @backup");
-    EXPECT_EQ(ReadFile(backup_), before_);
-    EepromImage expected = before_;
-    Protocol::StoreBig32(&expected[4608], 0x3F000000);
-    Protocol::StoreBig32(&expected[4612], 0xC0000000);
-    Protocol::StoreBig32(&expected[4708], 0x01020304);
-    EXPECT_EQ(instrument_.Eeprom(), expected);
-    EXPECT_EQ(JsonOf("calibration show --json")["calibration"]["1211"], 0x01020304);
-    EXPECT_EQ(tool_.Json()["calibration"]["1000"], (nlohmann::json{0.5, -2.0}));
-    Succeed("calibration set 1211=77 1000=-1,-1 --no-backup");
-    ExpectUnchanged();
-}
-
 TEST_P(MemoryCommandsTest, ChangesOfAnImageFileNeedNoInstrument) {
     host_.Bus().Unplug("sim");
     WriteFile(image_, before_);
@@ -392,37 +381,88 @@ TEST_P(RamTest, TimesFollowTheModeThatTheInstrumentIsIn) {
 TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
     auto& instrument = host_.Add("sim");
     Succeed("ram set 2009=0.005");
-    for (const auto& [seconds, text] :
-         {std::pair("10", "Integration time too high"), {"0.0009", "Integration time too low"}}) {
-        Fail(std::string("ram set 2009=") + seconds, ExitCode::BadData, text);
-        EXPECT_THAT(tool_.Err(), HasSubstr("mode 3: 0.001 s to 0.65535 s"));
+    const std::string modes =
+        "\n       mode 1: 0.00884 s to 4.45638 s; mode 2: 0.00442 s to 2.22819 s; mode 3: 0.001 s to 0.65535 "
+        "s\n";
+    for (const auto& [set, text] : std::vector<std::pair<std::string, std::string>>{
+             {"2009=10", "Integration time too high: 10 s fits none of the instrument's modes" + modes},
+             {"2009=0.0009",
+              "Integration time too low: 0.0009 s fits none of the instrument's modes" + modes},
+             {"2009=0.05 2001=600",
+              "2001=600: the instrument cannot count that far\n       the longest is 579.329 s, in the "
+              "measurement mode that 2009 asks for\n"},
+         }) {
+        Fail("ram set " + set, ExitCode::BadData);
+        EXPECT_EQ(tool_.Err(), "ostra: " + text);
         EXPECT_EQ(ModeOf(instrument), 2) << "back in its mode";
     }
-    Fail("ram set 2009=0.05 2001=600", ExitCode::BadData, "the longest is 579.329 s");
-    EXPECT_EQ(ModeOf(instrument), 2) << "back in its mode";
-
     auto& old = host_.Add("sim", {.firmware = Simulator::OldFirmware});
     Succeed("ram set 2009=0.068 2001=0.0884");
-    Fail("ram set 2009=4.4565", ExitCode::BadData, "the longest is 4.45638 s");  // 16 bits
+    Fail("ram set 2009=4.4565", ExitCode::BadData, "the longest is 4.45638 s\n");  // 16 bits
     EXPECT_EQ(ParametersOf(old).p1, 1000);
     EXPECT_EQ(ParametersOf(old).p2, 10);
 }
 
-TEST_P(RamTest, RefusesWhatCannotBeSet) {
+TEST_P(RamTest, ShowNamesEachParameter) {
     host_.Add("sim");
-    for (const char* assignment : {"2004=1", "2006=1", "2012=1", "2013=1", "2016=1", "2017=1", "2020=1",
-                                   "2021=1", "2005=1", "1211=1", "2009=x", "2010=1,2", "2009"}) {
+    Succeed("ram show");
+    EXPECT_EQ(tool_.Out(),
+              "  ID  VALUE     MEANING\n"
+              "2000  0         flag, bit 1\n"
+              "2001  0         second time, seconds\n"
+              "2002  0         flag, bit 2\n"
+              "2003  0         flag, bit 3\n"
+              "2008  0         flag, bit 0\n"
+              "2009  0.019992  integration time, seconds\n"
+              "2010  1         third parameter, at most 256\n"
+              "2004  67        MISC m3\n"
+              "2005  -1        not loaded\n"
+              "2006  1286      MISC m4\n"
+              "2012  33        MISC m1\n"
+              "2013  301       MISC m2\n"
+              "2020  1800      MISC m5\n"
+              "2011  -1        not loaded\n"
+              "2014  -1        not loaded\n"
+              "2015  -1        not loaded\n"
+              "2016  0.25      from MISC m2\n"
+              "2017  0.005     from MISC m2\n"
+              "9189  -1        in the place of 2010, with 2008\n"
+              "2021  85        fifth parameter\n");
+}
+
+TEST_P(RamTest, RefusesWhatCannotBeSet) {
+    auto& instrument = host_.Add("sim");
+    for (const std::string id :
+         {"2004", "2006", "2012", "2013", "2016", "2017", "2020", "2021", "2005", "1211"}) {
+        Fail("ram set " + id + "=1", ExitCode::Usage);
+        EXPECT_EQ(tool_.Err(),
+                  "ostra: " + id +
+                      " cannot be set\n       2000, 2001, 2002, 2003, 2008, 2009, 2010 and 9189 can\n");
+    }
+    for (const char* assignment : {"2009=x", "2010=1,2", "2009"}) {
         Fail(std::string("ram set ") + assignment, ExitCode::Usage);
     }
-    for (const char* assignment :
-         {"2009=-1", "2001=-0.1", "2010=-1", "2010=257", "2010=70000", "2000=2", "9189=65536"}) {
-        Fail(std::string("ram set ") + assignment, ExitCode::BadData);
+    for (const char* assignment : {"2009=-1", "2001=-0.1", "2010=-1"}) {
+        Fail(std::string("ram set ") + assignment, ExitCode::BadData, "knows no negative numbers");
     }
+    for (const auto& [id, most] :
+         {std::pair(2000, 1), {2002, 1}, {2003, 1}, {2008, 1}, {2010, 256}, {9189, 65535}}) {
+        const std::string known = std::to_string(id) + "=" + std::to_string(most);
+        Succeed("ram set 2003=0 2008=1 " + known);
+        const std::string assignment = std::to_string(id) + "=" + std::to_string(most + 1);
+        Fail("ram set " + assignment, ExitCode::BadData);
+        EXPECT_EQ(tool_.Err(),
+                  "ostra: " + assignment + ": at most " + std::to_string(most) + " can be sent\n");
+    }
+    EXPECT_EQ(ParametersOf(instrument).p3, 65535);
 }
 
 TEST_P(RamTest, TellsWhatElseHasChanged) {
     auto& instrument = host_.Add("sim");
-    EXPECT_EQ(tool_.Run("ram set 9189=300"), ExitCode::Usage) << "it would have no effect";
+    Fail("ram set 9189=1", ExitCode::Usage);  // it would have no effect
+    EXPECT_EQ(tool_.Err(),
+              "ostra: 9189 takes the place of 2010 only together with 2008=1\n       ostra ram set 9189=1 "
+              "2008=1\n");
     EXPECT_EQ(JsonOf("ram set 9189=300 2008=1 --json")["changes"],
               nlohmann::json::parse(R"([{"id":9189,"before":-1,"after":300},
         {"id":2008,"before":0,"after":0},{"id":2010,"before":1,"after":300}])"));

@@ -39,6 +39,17 @@ TEST_F(EventReaders, TakeWhatComesWhileTheyLive) {
     }
 }
 
+/// Whatever has failed, it is looked whether an instrument whose transfer it was is still there.
+TEST_F(EventReaders, AFailureNamesItsInstrumentAndWhetherThatHasGone) {
+    const auto explain = [this](auto exception) {
+        return std::string(context_.Explain(std::make_exception_ptr(exception), "native/gone").what());
+    };
+    EXPECT_EQ(explain(IOException("broken", "")), "native/gone: unplugged (a transfer failed (broken))");
+    EXPECT_EQ(explain(TimeoutException("late", "")),
+              "native/gone: unplugged (the instrument did not answer in time (late))");
+    EXPECT_EQ(explain(DataException("odd", "")), "native/gone: odd");
+}
+
 TEST_F(EventReaders, TellARemovalFromMessagesThatEndForAnotherReason) {
     EventReader reader(mailbox_, instrument_);
     mailbox_.MessageFromDevice(DeviceDriver::Generic::MessageDeviceGone, 0);

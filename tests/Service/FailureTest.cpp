@@ -27,7 +27,9 @@ TEST(FailureTest, TransfersByTheirCode) {
              {996, FailureKind::Timeout},                // still running
              {1166, FailureKind::TransferFailed},        // not the code of the next row
              {1167, FailureKind::Unplugged},             // gone
+             {0xE0001020, FailureKind::InUse},           // acquired exclusively
              {0xE0001021, FailureKind::InUse},           // opened by another process
+             {0xE0006000, FailureKind::Timeout},         // on the bus
              {0xE000100C, FailureKind::Timeout},         // timed out
              {0xE000100A, FailureKind::Unplugged},       // removed
              {0xE0000030, FailureKind::TransferFailed},  // halted
@@ -56,6 +58,7 @@ TEST(FailureTest, OtherClasses) {
         << "a system's text ends with a line break";
     EXPECT_EQ(DescribeText<Varnholt::Utilities::Exceptions::ResourceException>("x").Kind(),
               FailureKind::Other);
+    EXPECT_EQ(DescribeText<Varnholt::Utilities::Exceptions::InvalidArgumentException>("x").Message(), "x");
     EXPECT_EQ(Describe(std::make_exception_ptr(std::bad_alloc())).Message(), "not enough memory");
     EXPECT_EQ(Describe(std::make_exception_ptr(7)).Kind(), FailureKind::Other);
     const Failure ofFile =

@@ -1,4 +1,5 @@
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
+#include "Platform/Owned.h"
 #include "Service/InterruptibleDeviceFiles.h"
 #include "Support/DriverTest.h"
 
@@ -30,6 +31,37 @@ TEST_P(Interruptions, RefuseAtOnceWhatBeginsBehindThem) {
     }
     files.Interrupt(Paths(2)[1]);
     EXPECT_NO_THROW(setMode()) << "of another device";
+}
+
+TEST_P(Interruptions, AbortThePipesOnWhichTransfersRun) {
+    using Platform::Operation;
+    std::string told;
+    Service::InterruptibleDeviceFiles files(driver_, [&](const std::string& line) { told += line; });
+    const auto open = [&](std::size_t device, const std::string& pipe) {
+        return files.Open(Paths(2)[device] + (IsNative() ? "\\PIPE0" + pipe : ""));
+    };
+    files.Open(Paths(2)[0]);
+    files.Open(Paths(2)[1]);
+    const auto idle = open(1, "1"), busy = open(1, "2");
+    const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
+    Platform::Overlapped record{.event = event.Get()};
+    Bytes data(4);
+    driver_.Script(IsNative() ? 2 : 0, {.after = Never});
+    files.Start(busy, Operation::Write(data.data(), 4), record);
+    files.CloseFile(idle);
+    driver_.TakeTranscript();
+    driver_.Script(0, {.after = Never});
+    const Stopwatch watch(clock_);
+    files.Interrupt(Paths(2)[1]);
+    watch.ExpectBetween(2000, 2010);  // for the driver's answer
+    EXPECT_THAT(
+        driver_.TakeTranscript(),
+        ElementsAre(IsNative() ? "control 220009 00 00 00 00 00 00 03 00 00 00 /" : "control 80942084 /",
+                    "cancel 0"));
+    files.CancelTransfers(busy);
+    std::uint32_t moved = 0;
+    EXPECT_FALSE(files.GetResult(busy, record, moved, false));
+    EXPECT_EQ(told, "bulk out 0 of 4: cancelled");
 }
 
 }  // namespace

@@ -91,6 +91,7 @@ TEST_F(RamAccessTest, WhatWasLoadedIsKeptAndWhatIsTypedTakenInEveryMode) {
             ASSERT_TRUE(Store(static_cast<float>(factor * tick * 1e-6)));
             ASSERT_EQ(std::pair(int{instrument_.mode}, std::uint32_t{instrument_.p1}), std::pair(1, factor))
                 << factor << " x " << tick;
+            ASSERT_FALSE(Store(static_cast<float>((factor * tick - 0.4) * 1e-6)) && instrument_.mode == 1);
         }
     }
 }

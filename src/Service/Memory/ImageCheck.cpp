@@ -276,7 +276,7 @@ class Checker final {
         std::set<std::uint32_t> words;
         for (std::uint32_t at = Map::RawWords; at < Map::EndOfLogArea; ++at) {
             if (image_[at] != 0xFF) {
-                words.insert((at - Map::RawWords) / Map::RawWordSize);
+                words.insert(at / Map::RawWordSize);
             }
         }
         Add(Severity::Fine, "raw words",
