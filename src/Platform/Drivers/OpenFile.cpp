@@ -60,7 +60,6 @@ bool OpenFile::Start(const Operation& operation, Overlapped& record) {
     }
     request->endpoint.store(request->transfer.endpoint, std::memory_order_relaxed);
     if (decision.kind == Decision::Kind::Done) {
-        MarkRunning(record, nullptr);
         MarkEnded(record, Errors::Success, decision.bytes);
         Retire(*request);
         return true;
@@ -247,7 +246,6 @@ bool OpenFile::WaitFor(const Overlapped& record) {
         const std::uint32_t limit = request->waitLimit.load(std::memory_order_relaxed);
         if (!request->AwaitEnd(limit != 0 ? limit : Infinite)) {
             GiveUp(*request);
-            request->AwaitEnd(Infinite);
         }
     }
     return true;

@@ -89,10 +89,9 @@ ErrorCode UsbIoDevice::Bind(std::uint8_t endpoint, Binding& binding) {
     return Status::Success;
 }
 
-void UsbIoDevice::Unbind(Binding& binding) {
+void UsbIoDevice::Unbind(std::uint8_t endpoint) {
     const std::lock_guard holder(lock_);
-    std::erase(bound_, binding.load());
-    binding = 0;
+    std::erase(bound_, endpoint);
 }
 
 UsbIoDevice::Parameters UsbIoDevice::ReadParameters() {

@@ -37,7 +37,7 @@ class UsbIoDevice final {
     ErrorCode Unconfigure();
 
     ErrorCode Bind(std::uint8_t endpoint, Binding& binding);
-    void Unbind(Binding& binding);
+    void Unbind(std::uint8_t endpoint);
 
     Parameters ReadParameters();
     void WriteParameters(const Parameters& source);
