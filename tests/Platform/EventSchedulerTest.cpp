@@ -1,9 +1,7 @@
-#include <gmock/gmock.h>
+#include <gtest/gtest.h>
 
 #include <atomic>
 #include <memory>
-#include <string>
-#include <vector>
 
 #include "EachClock.h"
 #include "Platform/EventScheduler.h"
@@ -12,34 +10,8 @@
 namespace Varnholt::Platform {
 namespace {
 
-using testing::ElementsAre;
 using Schedulers = EachClock;
 INSTANTIATE_FOR_EACH_CLOCK(Schedulers);
-
-TEST_P(Schedulers, CallEventsInOrderOfTime) {
-    EventScheduler& scheduler = ClockScheduler();
-    const std::uint64_t start = scheduler.Now();
-    const OwnedHandle done(MakeAutoResetEvent());
-    std::vector<std::string> calls;  // events are called one at a time
-    const auto note = [&](const char* text, std::uint64_t due) {
-        EXPECT_GE(scheduler.Now(), start + due);
-        calls.emplace_back(text);
-    };
-    scheduler.CallAt(start, [&] {  // planned in an event, so that none begins before all are planned
-        scheduler.CallAt(start + 30'000, [&] {
-            note("last", 30'000);
-            SignalEvent(done.Get());
-        });
-        scheduler.CallAt(start + 10'000, [&] {
-            note("first", 10'000);
-            scheduler.CallAt(0, [&] { note("at once", 10'000); });
-            EXPECT_THAT(calls, ElementsAre("first")) << "called from inside CallAt";
-        });
-        scheduler.CallAt(start + 20'000, [&] { note("second", 20'000); });
-    });
-    EXPECT_EQ(Wait(done.Get(), LongTimeout), WaitResult::Signalled);
-    EXPECT_THAT(calls, ElementsAre("first", "at once", "second", "last"));
-}
 
 TEST_P(Schedulers, ForgetEvents) {
     EventScheduler& scheduler = ClockScheduler();

@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
+#include <thread>
 
 #include "EachClock.h"
 #include "Platform/ErrorCodes.h"
@@ -15,7 +16,7 @@ INSTANTIATE_FOR_EACH_CLOCK(Threads);
 
 TEST_P(Threads, RememberTheirPriority) {
     EXPECT_EQ(CurrentThreadPriority(), 0);
-    for (const int level : {HighestThreadPriority, -1, 1, 0}) {
+    for (const int level : {HighestThreadPriority, -HighestThreadPriority, 1, 0}) {
         EXPECT_TRUE(SetCurrentThreadPriority(level));
         EXPECT_EQ(CurrentThreadPriority(), level);
         TestThread([] { EXPECT_EQ(CurrentThreadPriority(), 0) << "a priority is one thread's"; }).Join();
@@ -29,6 +30,12 @@ TEST_P(Threads, HaveTheirOwnLastError) {
     TestThread([] { EXPECT_EQ(ErrorOf(SignalEvent(NoHandle)), Errors::InvalidHandle); }).Join();
     SleepMilliseconds(1);
     EXPECT_EQ(LastError(), Errors::Busy);
+}
+
+TEST(ThreadsOfTheHost, AbandonWhatTheyOwnAtTheirEnd) {
+    const OwnedHandle mutex(MakeMutex(""));
+    std::thread([&] { Wait(mutex.Get(), 0); }).join();
+    EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Abandoned);
 }
 
 /// A caller that forces a thread to its end must be able to rely on the answer.

@@ -115,6 +115,7 @@ TEST_P(Waits, RefuseWhatIsNoHandleOrNamesAnotherKindOfObject) {
         expectInvalid(!ReleaseSemaphore(handle, 1));
     }
     expectInvalid(!SignalEvent(mutex.Get()));
+    expectInvalid(!Close(NoHandle));
     expectInvalid(!ReleaseMutex(event.Get()));
     expectInvalid(!ReleaseSemaphore(event.Get(), 1));
     EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
@@ -164,6 +165,13 @@ TEST_P(Waits, EndWithWhicheverObjectComesFirstAndOutlastAClosedHandle) {
 
 TEST_P(Waits, ForAMutexAreRecursiveAndOfOneThread) {
     for (const std::string& name : {std::string(), NameFor("recursion")}) {
+        const auto acquire = [&] {
+            const OwnedHandle closed(MakeMutex(name));
+            EXPECT_EQ(Wait(closed.Get(), 0), WaitResult::Signalled)
+                << "a mutex nobody has a handle of is free";
+        };
+        acquire();
+        TestThread(acquire).Join();
         const OwnedHandle mutex(MakeMutex(name));
         EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
         EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Signalled);
@@ -258,6 +266,7 @@ TEST_P(Waits, WithASignalReleaseAMutex) {
         });
         EXPECT_EQ(SignalAndWait(mutex.Get(), semaphore.Get(), LongTimeout), WaitResult::Signalled);
         EXPECT_EQ(ErrorOf(ReleaseMutex(mutex.Get())), Errors::NotOwner);
+        EXPECT_EQ(SignalAndWait(semaphore.Get(), semaphore.Get(), 0), WaitResult::Signalled);
     }
 }
 

@@ -5,7 +5,6 @@
 #include <vector>
 
 #include "Platform/Drivers/DriverFixture.h"
-#include "Platform/EventScheduler.h"
 #include "Platform/OverlappedRequest.h"
 #include "Platform/TestThread.h"
 #include "Platform/Threads.h"
@@ -79,26 +78,6 @@ TEST_F(OverlappedFiles, ARequestThatHasFailedEndsWithoutCancellingOthers) {
     EXPECT_EQ(device_->cancellations, 0);
 }
 
-// Without an event of the record, and where none can be had.
-TEST_F(OverlappedFiles, WaitWithoutAnEvent) {
-    Request bare;
-    bare.record.event = Platform::NoHandle;
-    FailCalls("MakeAutoResetEvent");
-    for (Request* const request : {&bare, &request_}) {
-        StartPending(pipe_, buffer_, *request);
-        std::thread sender([this] {
-            Platform::SleepMilliseconds(5);
-            device_->Send(In, {1, 2});
-        });
-        EXPECT_EQ(Result(pipe_, *request, true), (Outcome{0, 2}));
-        sender.join();
-    }
-    StartPending(pipe_, buffer_, bare);
-    EXPECT_TRUE(files_->CloseFile(pipe_));
-    Platform::InstallCallFilter({});
-    EXPECT_EQ(Result(pipe_, bare), (Outcome{Errors::OperationAborted, 0}));
-}
-
 // The signal of a shared event says that one of its requests has ended, not which.
 TEST_F(OverlappedFiles, WaitForTheirOwnEndWhereAnEventIsShared) {
     const auto interruptPipe = OpenPipe(Native::InterruptPipe);
@@ -141,29 +120,6 @@ TEST_F(OverlappedFiles, CancelOnlyWhatTheCallerStartedOnTheFile) {
     files_.reset();
     EXPECT_EQ(device_->handles, 0) << "all files left open are closed with the file system";
     EXPECT_TRUE(requests[3].TakeSignal());
-}
-
-TEST_F(OverlappedFiles, ClosingEndsWhatRuns) {
-    for (const bool later : {false, true}) {
-        if (later) {
-            device_->onCancel = [](Transfer& transfer) {
-                Platform::ClockScheduler().CallAt(0,
-                                                  [&] { Complete(transfer, TransferStatus::Cancelled, 0); });
-            };
-        }
-        std::vector<Bytes> buffers(20, Bytes(8));
-        std::vector<Request> requests(20);
-        for (std::size_t i = 0; i < requests.size(); ++i) {
-            std::thread([&] { StartPending(pipe_, buffers[i], requests[i]); }).join();
-        }
-        EXPECT_TRUE(files_->CloseFile(pipe_));
-        for (Request& each : requests) {
-            EXPECT_EQ(Result(pipe_, each), (Outcome{Errors::OperationAborted, 0}));
-            EXPECT_TRUE(each.TakeSignal());
-        }
-        EXPECT_EQ(device_->handles, 0);
-        pipe_ = OpenPipe(Native::ReadPipe);
-    }
 }
 
 TEST_F(OverlappedFiles, RefuseHandlesThatNameNothing) {
@@ -301,7 +257,7 @@ TEST_F(OverlappedFiles, RunOutOfPlacesAndRecover) {
         opened.push_back(file);
     }
     EXPECT_EQ(Platform::LastError(), Errors::NoSystemResources);
-    EXPECT_GE(opened.size(), 512u) << "four files on each of 127 instruments";
+    EXPECT_EQ(opened.size() + 1, 1024U) << "more than four files on each of 127 instruments";
     EXPECT_TRUE(files_->CloseFile(opened.front()));
     Open("usbio/port1");
 }
