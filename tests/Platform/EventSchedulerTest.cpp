@@ -1,10 +1,14 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
+#include <functional>
 #include <memory>
+#include <thread>
+#include <utility>
 
 #include "EachClock.h"
 #include "Platform/EventScheduler.h"
+#include "Platform/RealScheduler.h"
 #include "TestThread.h"
 
 namespace Varnholt::Platform {
@@ -59,6 +63,12 @@ TEST_P(Schedulers, ForgetReturnsAfterACallThatIsRunning) {
         scheduler.Forget(&over);
         EXPECT_TRUE(over);
     });
+}
+
+TEST(RealSchedulers, EndBeforeTheirEvents) {
+    RealScheduler scheduler([](std::function<void()> run) { return std::thread(std::move(run)); });
+    scheduler.CallAt(
+        scheduler.Now() + 60'000'000, [] { ADD_FAILURE(); }, nullptr);
 }
 
 /// Events from several threads that come and go quickly, so that the scheduler's own thread does as well.

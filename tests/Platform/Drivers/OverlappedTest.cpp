@@ -74,7 +74,9 @@ TEST_F(OverlappedFiles, ARequestThatHasFailedEndsWithoutCancellingOthers) {
         device_->onSubmit = {};
         going.Start(pipe_, Operation::Read(other.data(), 8));
         Complete(*transfer, TransferStatus::Stalled, 0);
+        SetLastError(Errors::Busy);
     }
+    EXPECT_EQ(LastError(), Errors::Busy) << "the end of a request is no call of its own";
     EXPECT_EQ(device_->cancellations, 0);
 }
 
