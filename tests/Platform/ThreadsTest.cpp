@@ -47,6 +47,7 @@ TEST_P(Threads, EndByForceOrSayThatTheyCannot) {
         left = true;
     });
     SleepMilliseconds(20);
+    EXPECT_FALSE(thread.HasEnded() || left) << "who asks without waiting does not wait";
     const bool isEnded = EndThreadByForce(thread.Get(), 0xFFFFFFFF);
     SignalEvent(leave.Get());
     thread.Join();
