@@ -1,13 +1,9 @@
-#include <gtest/gtest.h>
 
 #include <atomic>
-#include <functional>
 #include <memory>
 #include <thread>
-#include <utility>
 
 #include "EachClock.h"
-#include "Platform/EventScheduler.h"
 #include "Platform/RealScheduler.h"
 #include "TestThread.h"
 

@@ -1,11 +1,8 @@
-#include <gtest/gtest.h>
 
 #include <atomic>
 #include <thread>
 
 #include "EachClock.h"
-#include "Platform/ErrorCodes.h"
-#include "Platform/Threads.h"
 #include "TestThread.h"
 
 namespace Varnholt::Platform {

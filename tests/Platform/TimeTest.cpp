@@ -1,4 +1,3 @@
-#include <gtest/gtest.h>
 
 #include <array>
 #include <chrono>
@@ -6,7 +5,6 @@
 #include <limits>
 
 #include "EachClock.h"
-#include "Platform/EventScheduler.h"
 #include "Platform/Threads.h"
 #include "Platform/Time.h"
 

@@ -1,15 +1,12 @@
-#include <gtest/gtest.h>
 
 #include <array>
 #include <atomic>
 #include <deque>
-#include <functional>
 #include <mutex>
 #include <vector>
 
 #include "EachClock.h"
 #include "Platform/Time.h"
-#include "Platform/WaitableObjects.h"
 #include "TestThread.h"
 #include "UniqueName.h"
 

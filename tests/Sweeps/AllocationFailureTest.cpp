@@ -6,17 +6,12 @@
 #include <cstdio>
 #include <cstdlib>
 #include <functional>
-#include <iterator>
-#include <memory>
 #include <mutex>
 #include <new>
-#include <string>
-#include <thread>
 #include <utility>
 #include <vector>
 
 #include "ostra.h"
-#include "Platform/EventScheduler.h"
 #include "Platform/Threads.h"
 #include "Platform/Usb/UsbDevice.h"
 #include "Platform/WaitableObjects.h"

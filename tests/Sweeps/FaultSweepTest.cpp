@@ -2,22 +2,17 @@
 // outcome is a documented one, within a bounded time, the instrument can be opened again, and whatever fails,
 // a log is left in its memory and nothing else is touched.
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
-#include <algorithm>
 #include <array>
 #include <functional>
 #include <numeric>
-#include <optional>
 #include <regex>
 #include <span>
-#include <string>
 #include <utility>
 #include <vector>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
-#include "FaultPlan.h"
 #include "FreshEeprom.h"
 #include "ostra.h"
 #include "Protocol/EepromMap.h"

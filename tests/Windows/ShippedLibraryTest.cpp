@@ -17,7 +17,6 @@
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFileSystem.h"
 #include "Platform/EventScheduler.h"
-#include "Platform/Win32/Windows.h"
 #include "SimulatedBus.h"
 #include "StandInDriver.h"
 #include "Support/Bytes.h"

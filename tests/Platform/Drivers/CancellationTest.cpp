@@ -1,4 +1,3 @@
-#include <gtest/gtest.h>
 
 #include <array>
 #include <atomic>
@@ -8,8 +7,6 @@
 #include "Descriptors.h"
 #include "Platform/Drivers/DriverFixture.h"
 #include "Platform/EventScheduler.h"
-#include "Platform/TestThread.h"
-#include "Platform/Threads.h"
 #include "SimulatedBus.h"
 #include "Support/MeasuredBytes.h"
 #if !defined(_WIN32)

@@ -1,13 +1,9 @@
 #include <atomic>
 #include <new>
-#include <string>
 #include <thread>
-#include <vector>
 
 #include "Platform/Drivers/DriverFixture.h"
 #include "Platform/OverlappedRequest.h"
-#include "Platform/TestThread.h"
-#include "Platform/Threads.h"
 #include "Support/FailCalls.h"
 
 namespace Varnholt::Tests {

@@ -1,5 +1,4 @@
 #include "Platform/Drivers/DriverFixture.h"
-#include "Platform/EventScheduler.h"
 #include "Support/TestClock.h"
 
 namespace Varnholt::Tests {

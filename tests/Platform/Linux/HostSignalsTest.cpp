@@ -1,5 +1,3 @@
-#include <gtest/gtest.h>
-#include <signal.h>
 
 #include <array>
 #include <cstdlib>

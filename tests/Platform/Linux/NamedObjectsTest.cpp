@@ -1,13 +1,10 @@
-#include <gtest/gtest.h>
 
 #include <array>
 #include <cstdio>
 #include <deque>
 #include <fstream>
-#include <string>
 
 #include "ForkedProcess.h"
-#include "Platform/Threads.h"
 #include "TestThread.h"
 #include "UniqueName.h"
 

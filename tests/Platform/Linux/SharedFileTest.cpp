@@ -1,18 +1,14 @@
 #include <fcntl.h>
-#include <gtest/gtest.h>
 #include <sys/file.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include <filesystem>
 #include <fstream>
 #include <set>
 
 #include "ForkedProcess.h"
-#include "Platform/ErrorCodes.h"
 #include "Platform/Linux/SharedFile.h"
-#include "Platform/WaitableObjects.h"
 #include "TestThread.h"
 #include "UniqueName.h"
 
