@@ -37,7 +37,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* input, std::size_t siz
     if (size % 4 == 0) {
         UsbIpSocket socket(ends[0]);
         connected = true;
-        ListUsbIpDevices(socket);
+        FirstUsbIpDevice(socket);
     } else {
         std::array transfers{
             TestTransfer::VendorQuestion(Varnholt::Protocol::Request::GetMisc, 64),

@@ -6,7 +6,6 @@
 #include <fstream>
 #include <optional>
 #include <set>
-#include <sstream>
 #include <utility>
 
 #include "Platform/Linux/ErrnoCodes.h"
@@ -18,27 +17,17 @@
 namespace Varnholt::Platform::Usb {
 namespace {
 
-/// The names of the sockets at which somebody listens, in order.
-std::set<std::string> ListeningSockets() {
-    constexpr unsigned long acceptsConnections = 0x10000;
+/// The names of simulators' sockets, in order. Whether somebody still listens there, connecting tells.
+std::set<std::string> SimulatorSockets() {
     const std::string prefix = std::string("@") + SimulatorSocketPrefix;
     std::set<std::string> sockets;
     std::ifstream table("/proc/net/unix");
     std::string line;
     while (std::getline(table, line)) {
-        if (line.find(prefix) == std::string::npos) {
-            continue;  // a desktop has hundreds of others
-        }
-        std::istringstream fields(line);
-        std::string other;
-        unsigned long flags = 0;
-        std::string path;
-        fields >> other >> other >> other >> std::hex >> flags >> other >> other >> other >> path;
-        if (fields && (flags & acceptsConnections) != 0 && path.starts_with(prefix)) {
-            const std::string name = path.substr(prefix.size());
-            if (IsSimulatorName(name)) {
-                sockets.insert(name);
-            }
+        const std::size_t start = line.find(prefix);
+        const std::string name = start == std::string::npos ? "" : line.substr(start + prefix.size());
+        if (IsSimulatorName(name)) {
+            sockets.insert(name);
         }
     }
     return sockets;
@@ -82,12 +71,12 @@ UsbIpConnector ConnectorTo(const std::string& name) {
 /// Finds out who uses it: the simulator writes who has opened the instrument behind its path.
 void AskForUser(Linux::FileDescriptor file, SimulatorInfo& info) {
     UsbIpSocket socket(file.Release());
-    const auto records = ListUsbIpDevices(socket);
-    info.answers = records && !records->empty();
-    if (!info.answers) {
+    const auto record = FirstUsbIpDevice(socket);
+    info.answers = record.has_value();
+    if (!record) {
         return;
     }
-    const std::string& path = records->front().path;
+    const std::string& path = record->path;
     if (const auto mark = path.find(UsedByMark); mark != std::string::npos) {
         info.usedBy = path.substr(mark + std::string(UsedByMark).size());
     }
@@ -97,7 +86,7 @@ class SimulatorsOfThisUser final : public UsbBus {
   public:
     std::vector<std::string> List() override {
         std::vector<std::string> names;
-        for (const std::string& name : ListeningSockets()) {
+        for (const std::string& name : SimulatorSockets()) {
             if (IsUsableSimulator(name)) {
                 names.push_back(SimulatedPrefix + name);
             }
@@ -136,7 +125,7 @@ class SimulatorsOfThisUser final : public UsbBus {
 
 std::vector<SimulatorInfo> ListSimulators() {
     std::vector<SimulatorInfo> simulators;
-    for (const std::string& name : ListeningSockets()) {
+    for (const std::string& name : SimulatorSockets()) {
         if (auto connection = Connect(name)) {
             SimulatorInfo& info = simulators.emplace_back(std::move(connection->info));
             if (info.usable) {

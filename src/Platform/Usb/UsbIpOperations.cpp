@@ -54,31 +54,16 @@ ErrorCode ImportUsbIpDevice(UsbIpSocket& socket, const std::string& busId, std::
     return Errors::Success;
 }
 
-std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(UsbIpSocket& socket) {
-    constexpr std::uint32_t mostDevices = 256;
+std::optional<UsbIp::DeviceRecord> FirstUsbIpDevice(UsbIpSocket& socket) {
     socket.ReceiveUntil(UsbIpSocket::Clock::now() + ListPatience);
     const auto reply = Ask(socket, UsbIp::Operation::ListRequest, {}, UsbIp::Operation::ListReply);
-    std::array<std::uint8_t, UsbIp::ListCountSize> countBytes{};
-    if (!reply || reply->status != UsbIp::OperationStatus::Ok || !socket.Receive(countBytes, true)) {
+    std::array<std::uint8_t, UsbIp::ListCountSize> count{};
+    if (!reply || reply->status != UsbIp::OperationStatus::Ok || !socket.Receive(count, true) ||
+        Protocol::LoadBig32(count.data()) == 0) {
         return std::nullopt;
     }
-    const std::uint32_t count = Protocol::LoadBig32(countBytes.data());
-    if (count > mostDevices) {
-        return std::nullopt;
-    }
-    std::vector<UsbIp::DeviceRecord> records;
-    for (std::uint32_t i = 0; i < count; ++i) {
-        UsbIp::DeviceRecordBytes bytes{};
-        if (!socket.Receive(bytes, true)) {
-            return std::nullopt;
-        }
-        records.push_back(UsbIp::DecodeDeviceRecord(bytes));
-        std::vector<std::uint8_t> interfaces(records.back().interfaces * UsbIp::InterfaceRecordSize);
-        if (!socket.Receive(interfaces, true)) {
-            return std::nullopt;
-        }
-    }
-    return records;
+    UsbIp::DeviceRecordBytes bytes{};
+    return socket.Receive(bytes, true) ? std::optional(UsbIp::DecodeDeviceRecord(bytes)) : std::nullopt;
 }
 
 }  // namespace Varnholt::Platform::Usb

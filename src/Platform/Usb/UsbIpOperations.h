@@ -3,7 +3,6 @@
 #include <cstdint>
 #include <optional>
 #include <string>
-#include <vector>
 
 #include "Platform/ErrorCodes.h"
 #include "Platform/Usb/UsbIpProtocol.h"
@@ -15,8 +14,8 @@ namespace Varnholt::Platform::Usb {
 /// Imports the device with the bus id `busId`; packets to it carry `deviceId`.
 ErrorCode ImportUsbIpDevice(UsbIpSocket& socket, const std::string& busId, std::uint32_t& deviceId);
 
-/// The devices that a peer exports; nothing when it does not answer properly within a second. The connection
-/// is of no use afterwards.
-std::optional<std::vector<UsbIp::DeviceRecord>> ListUsbIpDevices(UsbIpSocket& socket);
+/// The first device that a peer exports; nothing when there is none or the peer does not answer properly
+/// within a second. The connection is of no use afterwards.
+std::optional<UsbIp::DeviceRecord> FirstUsbIpDevice(UsbIpSocket& socket);
 
 }  // namespace Varnholt::Platform::Usb
