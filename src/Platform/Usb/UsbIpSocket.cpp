@@ -64,10 +64,7 @@ bool UsbIpSocket::Send(std::span<const std::uint8_t> header, std::span<const std
             patienceEnds = Clock::now() + Patience;
             continue;
         }
-        if (sent < 0 && errno == EINTR) {
-            continue;
-        }
-        if (sent < 0 && errno != EAGAIN) {
+        if (errno != EAGAIN && errno != EINTR) {
             return false;
         }
         pollfd state{file_.Get(), POLLOUT, 0};
@@ -111,10 +108,7 @@ bool UsbIpSocket::Receive(std::span<std::uint8_t> bytes, bool inMessage) {
             patienceEnds = Clock::now() + Patience;
             continue;
         }
-        if (received < 0 && errno == EINTR) {
-            continue;
-        }
-        if (received == 0 || errno != EAGAIN || !WaitToReceive(patienceEnds)) {
+        if (received == 0 || (errno != EAGAIN && errno != EINTR) || !WaitToReceive(patienceEnds)) {
             return false;
         }
     }
