@@ -181,7 +181,6 @@ ErrorCode UsbIpDevice::Submit(Transfer& transfer) try {
             return Errors::DeviceNotConnected;
         }
         packet.sequence = NextSequence();
-        transfer.actualLength = 0;
         running_.push_back({&transfer, packet.sequence});
     }
     packet.deviceId = deviceId_;
