@@ -151,6 +151,8 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
     // The connection has survived it, and nothing more was sent.
     TestTransfer last = TestTransfer::In(BulkInEndpoint, 1);
     device->Submit(last);
+    EXPECT_FALSE(last.Wait(std::chrono::milliseconds(1100)))
+        << "a cancellation that was answered has no limit";
     const auto submit = PeerReceivesPacket<UsbIp::SubmitPacket>();
     PeerSends(Join(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 1}), Bytes{9}));
     ASSERT_TRUE(last.Wait());
@@ -186,20 +188,26 @@ TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
         for (TestTransfer* const each : {&first, &second}) {
             ASSERT_TRUE(each->Wait());
             EXPECT_EQ(TransferStatus::DeviceGone, each->status);
+            EXPECT_EQ(0U, each->actualLength);
         }
         TestTransfer after = TestTransfer::In(BulkInEndpoint, 64);
         EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(after));
         EXPECT_EQ(Errors::DeviceNotConnected, device->Claim());
         device->Release();
         EXPECT_EQ(Errors::Success, device->Claim()) << "a new connection";
+        EXPECT_EQ(Errors::Success, device->Submit(after));
+        device->Release();
+        EXPECT_EQ(TransferStatus::Cancelled, after.status);
     }
-    for (const std::uint32_t sequence : {0U, 1000U}) {  // of a cancellation that nobody sent
+    for (const auto& packet :
+         std::vector<UsbIp::Packet>{UsbIp::UnlinkReply{0, -104},  // of cancellations that nobody sent
+                                    UsbIp::UnlinkReply{1000, -104}, UsbIp::SubmitPacket{}}) {
         const auto device = MakeClaimedDevice();
         TestTransfer transfer = TestTransfer::In(BulkInEndpoint, 64);
         ASSERT_EQ(Errors::Success, device->Submit(transfer));
-        PeerSends(UsbIp::Encode(UsbIp::UnlinkReply{sequence, -104}));
-        ASSERT_TRUE(transfer.Wait()) << sequence;
-        EXPECT_EQ(TransferStatus::DeviceGone, transfer.status) << sequence;
+        PeerSends(UsbIp::Encode(packet));
+        ASSERT_TRUE(transfer.Wait()) << packet.index();
+        EXPECT_EQ(TransferStatus::DeviceGone, transfer.status) << packet.index();
     }
 }
 
@@ -236,6 +244,8 @@ TEST_F(UsbIpDeviceTest, PeerMayReadSlowlyButHoldsUpNoSubmissionForEver) {
     ASSERT_TRUE(large.Wait());
     EXPECT_LT(Clock::now() - start, std::chrono::seconds(5));
     EXPECT_EQ(TransferStatus::DeviceGone, large.status);
+    TestTransfer largest = TestTransfer::Out(BulkOutEndpoint, Bytes(UsbIp::MaximumPayload));
+    EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(largest));
     TestTransfer tooLarge = TestTransfer::Out(BulkOutEndpoint, Bytes(UsbIp::MaximumPayload + std::size_t{1}));
     EXPECT_EQ(Errors::InvalidParameter, device->Submit(tooLarge));
 }
@@ -251,6 +261,7 @@ TEST_F(UsbIpDeviceTest, ImportFailuresAreToldApart) {
                                           {ImportReply(Status::NoDevice), Errors::DeviceNotConnected},
                                           {ImportReply(Status::Failed), Errors::GeneralFailure},
                                           {otherOperation, Errors::DeviceNotConnected},
+                                          {{}, Errors::DeviceNotConnected},
                                           {half, Errors::DeviceNotConnected}}) {
         const auto device = MakeDevice(reply);
         const auto start = Clock::now();
@@ -271,7 +282,7 @@ TEST_F(UsbIpDeviceTest, ImportFailuresAreToldApart) {
 TEST_F(UsbIpDeviceTest, EndpointsOfADeviceThatDoesNotAnswerAreNotAnEmptyList) {
     const auto device = MakeClaimedDevice();
     std::jthread peerThread([this] {
-        PeerReceivesPacket<UsbIp::SubmitPacket>();
+        EXPECT_EQ((SetupPacket{0x80, 6, 0x0200, 0, 255}), PeerReceivesPacket<UsbIp::SubmitPacket>().setup);
         PeerSends(
             UsbIp::Encode(UsbIp::UnlinkReply{PeerReceivesPacket<UsbIp::UnlinkPacket>().sequence, -104}));
     });

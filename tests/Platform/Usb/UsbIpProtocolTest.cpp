@@ -52,6 +52,7 @@ TEST(UsbIpProtocolTest, RefusesPacketsThatCannotBeServed) {
              {"unknown command", 3, 5, false},
              {"command 0", 3, 0, false},
              {"direction", 15, 2, false},
+             {"last endpoint", 19, 15, true},
              {"endpoint number", 19, 16, false},
              {"endpoint's high byte", 16, 1, false},
              {"one byte too long", 0x1B, 1, false},
@@ -65,7 +66,10 @@ TEST(UsbIpProtocolTest, RefusesPacketsThatCannotBeServed) {
     UsbIp::PacketBytes noPackets = good;
     std::fill_n(noPackets.begin() + 0x20, 4, std::uint8_t{0xFF});
     EXPECT_TRUE(UsbIp::DecodePacket(noPackets)) << "the other way to write no isochronous packets";
-    EXPECT_FALSE(UsbIp::DecodePacket(UsbIp::Encode(UsbIp::SubmitReply{1, 0, UsbIp::MaximumPayload + 1})));
+    for (const std::uint32_t excess : {0U, 1U}) {
+        const UsbIp::SubmitReply reply{1, 0, UsbIp::MaximumPayload + excess};
+        EXPECT_EQ(excess == 0, UsbIp::DecodePacket(UsbIp::Encode(reply)).has_value());
+    }
 }
 
 /// The kernel's own numbers: EPIPE, EPROTO, EOVERFLOW, ECONNRESET, ENODEV; and ENOENT, ESHUTDOWN and any
