@@ -68,6 +68,7 @@ void LibUsbEvents::Stop() {
         return;
     }
     stopping_ = true;
+    interrupted_ = 1;  // for who is still on the way there
     changed_.notify_all();
     libusb_interrupt_event_handler(context_);
     changed_.wait(lock, [this] { return !waiterHandles_; });

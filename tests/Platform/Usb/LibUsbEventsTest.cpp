@@ -2,6 +2,7 @@
 #include <libusb-1.0/libusb.h>
 
 #include <memory>
+#include <thread>
 
 #include "Platform/EventScheduler.h"
 #include "Platform/TestThread.h"
@@ -29,6 +30,8 @@ class LibUsbEventsTest : public testing::Test {
         libusb_exit(context_);
     }
 
+    bool IsHandled() const { return libusb_event_handler_active(context_) != 0; }
+
     static constexpr int Rounds = 2000;
     libusb_context* context_ = nullptr;
     std::shared_ptr<LibUsbEvents> events_;
@@ -42,7 +45,9 @@ TEST_F(LibUsbEventsTest, ItsThreadTakesNoSignalOfTheHost) {
 
 /// Each is in libusb, or about to go there, when the other wakes it.
 TEST_F(LibUsbEventsTest, WaitsEndInTimeLoseNoSignalAndOutlastTheEvents) {
+    const auto start = ClockScheduler().Now();
     EXPECT_EQ(Wait(back_.Get(), 30), WaitResult::TimedOut);
+    EXPECT_LT(ClockScheduler().Now() - start, 1'000'000U);
     const TestThread echo([this] {
         for (int i = 0; i < Rounds && Wait(there_.Get(), LongTimeout) == WaitResult::Signalled; ++i) {
             SignalEvent(back_.Get());
@@ -61,9 +66,8 @@ TEST_F(LibUsbEventsTest, WaitsEndInTimeLoseNoSignalAndOutlastTheEvents) {
 
 /// An aborted transfer, or the button's, may end when nobody waits.
 TEST_F(LibUsbEventsTest, OneThreadHandlesThemAndTheirOwnWhereNobodyWaits) {
-    const auto isHandled = [this] { return libusb_event_handler_active(context_) != 0; };
     EXPECT_EQ(Wait(back_.Get(), 50), WaitResult::TimedOut);
-    Tests::WaitUntil(isHandled);
+    Tests::WaitUntil([this] { return IsHandled(); });
     for (int i = 0; i < 2; ++i) {
         EXPECT_TRUE(events_->TryBegin());
         EXPECT_FALSE(events_->TryBegin()) << "another waits with them";
@@ -71,10 +75,20 @@ TEST_F(LibUsbEventsTest, OneThreadHandlesThemAndTheirOwnWhereNobodyWaits) {
     }
     events_->HandleAlways();
     EXPECT_FALSE(events_->TryBegin());
-    Tests::WaitUntil(isHandled);
+    Tests::WaitUntil([this] { return IsHandled(); });
     events_->Stop();
     EXPECT_FALSE(events_->TryBegin());
-    EXPECT_FALSE(isHandled());
+    EXPECT_FALSE(IsHandled());
+}
+
+TEST_F(LibUsbEventsTest, TheirEndAwaitsNobodyWhoIsAboutToWait) {
+    Tests::WaitUntil([this] { return IsHandled(); });
+    ASSERT_TRUE(events_->TryBegin());
+    const TestThread stopping([this] { events_->Stop(); });
+    std::this_thread::sleep_for(std::chrono::milliseconds(50));  // their own thread takes the interruption
+    const auto start = ClockScheduler().Now();
+    events_->HandleEvents(start + 5'000'000U);
+    EXPECT_LT(ClockScheduler().Now() - start, 1'000'000U);
 }
 
 }  // namespace
