@@ -27,9 +27,9 @@ namespace {
 constexpr const char* UdevDatabase = "/run/udev/data";
 constexpr std::chrono::milliseconds CoarsestTick(50);
 
-/// What is plugged into a port ("1-1.2") and its interfaces ("1-1.2:1.0"), not root hubs: a machine can have
-/// dozens of them, and udev walks through /sys for each that it looks at.
-constexpr const char* PortPattern = "[1-9]*-[1-9]*";
+/// What is plugged into a port ("1-1.2") and its interfaces ("1-1.2:1.0"), not root hubs ("usb1", "1-0:1.0"):
+/// a machine can have dozens of them, and udev walks through /sys for each that it looks at.
+constexpr const char* PortPattern = "*-[!0]*";
 
 using Udev = std::unique_ptr<udev, ReleasedBy<udev_unref>>;
 using Enumeration = std::unique_ptr<udev_enumerate, ReleasedBy<udev_enumerate_unref>>;
@@ -80,8 +80,6 @@ std::vector<UsbDeviceInfo> ListDevices(bool registeredOnly) {
     udev_enumerate_add_match_sysname(enumeration.get(), PortPattern);
     if (registeredOnly) {
         udev_enumerate_add_match_property(enumeration.get(), InterfaceClassProperty, "*");
-    } else {
-        udev_enumerate_add_match_property(enumeration.get(), "DEVTYPE", "usb_device");
     }
     udev_enumerate_scan_devices(enumeration.get());
     udev_list_entry* entry = nullptr;
