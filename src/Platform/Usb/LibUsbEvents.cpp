@@ -29,11 +29,11 @@ LibUsbEvents::LibUsbEvents(libusb_context* ownContext) : context_(ownContext) {
 void LibUsbEvents::RunThread() {
     std::unique_lock lock(mutex_);
     while (!stopping_) {
-        if (!handlesAlways_ && waiterHandles_) {
-            const auto isLeft = [this] { return !waiterHandles_ || handlesAlways_ || stopping_; };
-            if (!changed_.wait_for(lock, Patience, isLeft)) {  // who waits briefly need not wake this thread
+        if (waiterHandles_) {
+            const auto hasLeft = [this] { return !waiterHandles_; };
+            if (!changed_.wait_for(lock, Patience, hasLeft)) {  // who waits briefly need not wake this thread
                 threadAwaitsWaiter_ = true;
-                changed_.wait(lock, isLeft);
+                changed_.wait(lock, hasLeft);
                 threadAwaitsWaiter_ = false;
             }
             continue;
