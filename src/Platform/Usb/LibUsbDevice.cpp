@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <libusb-1.0/libusb.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -19,6 +20,7 @@
 #include "Platform/LookUp.h"
 #include "Platform/Usb/LibUsbEvents.h"
 #include "Platform/Usb/ReleasedBy.h"
+#include "Platform/Usb/UsbDescriptors.h"
 #include "Protocol/Instrument.h"
 
 namespace Varnholt::Platform::Usb {
@@ -73,6 +75,14 @@ struct Submission {
     std::vector<std::uint8_t> controlBuffer;
 };
 
+/// The kernel keeps the descriptors at the beginning of the device's file.
+std::vector<std::uint8_t> ReadDescriptors(int deviceFile) {
+    std::vector<std::uint8_t> bytes(4096);
+    const ssize_t count = pread(deviceFile, bytes.data(), bytes.size(), 0);
+    bytes.resize(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+    return bytes;
+}
+
 using Context = std::unique_ptr<libusb_context, ReleasedBy<libusb_exit>>;
 using DeviceHandle = std::unique_ptr<libusb_device_handle, ReleasedBy<libusb_close>>;
 
@@ -99,7 +109,10 @@ class LibUsbDevice final : public UsbDevice {
         events_->Stop();
     }
 
-    std::vector<EndpointInfo> Endpoints(ErrorCode& error) override;
+    std::vector<EndpointInfo> Endpoints(ErrorCode& error) override {
+        error = Errors::Success;
+        return endpoints_;
+    }
     ErrorCode Claim() override;
     void Release() override;
     ErrorCode Submit(Transfer& transfer) override;
@@ -123,6 +136,7 @@ class LibUsbDevice final : public UsbDevice {
     const Context context_;
     const DeviceHandle handle_;
     const std::shared_ptr<LibUsbEvents> events_;
+    const std::vector<EndpointInfo> endpoints_ = EndpointsOfFirstInterface(ReadDescriptors(file_.Get()));
 
     std::mutex mutex_;  // guards what follows; never held while a client is called
     std::condition_variable idle_;
@@ -130,25 +144,6 @@ class LibUsbDevice final : public UsbDevice {
     int running_ = 0;  // transfers whose clients have not been told of their end yet
     bool claimed_ = false;
 };
-
-std::vector<EndpointInfo> LibUsbDevice::Endpoints(ErrorCode& error) {
-    std::vector<EndpointInfo> endpoints;
-    libusb_config_descriptor* configuration = nullptr;
-    error =
-        ErrorFromLibUsb(libusb_get_config_descriptor(libusb_get_device(handle_.get()), 0, &configuration));
-    if (error != Errors::Success) {
-        return endpoints;
-    }
-    if (configuration->bNumInterfaces > 0 && configuration->interface[0].num_altsetting > 0) {
-        const libusb_interface_descriptor& setting = configuration->interface[0].altsetting[0];
-        for (int i = 0; i < setting.bNumEndpoints; ++i) {
-            const libusb_endpoint_descriptor& endpoint = setting.endpoint[i];
-            endpoints.push_back({endpoint.bEndpointAddress, endpoint.bmAttributes, endpoint.wMaxPacketSize});
-        }
-    }
-    libusb_free_config_descriptor(configuration);
-    return endpoints;
-}
 
 ErrorCode LibUsbDevice::Claim() {
     const std::lock_guard lock(mutex_);
