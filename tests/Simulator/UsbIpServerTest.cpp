@@ -202,6 +202,7 @@ TEST_F(UsbIpServerTest, OneProgramAtATime) {
     EXPECT_EQ(Errors::Busy, second->Claim());
     const std::string usedBy = Describe(name_).usedBy;
     EXPECT_NE(std::string::npos, usedBy.find("process " + std::to_string(getpid()))) << usedBy;
+    EXPECT_EQ(std::string::npos, usedBy.find(Platform::Usb::UsedByMark)) << usedBy;
     first->Release();
     EXPECT_EQ(Errors::Success, second->Claim()) << "free as soon as it is released";
     second->Release();
@@ -268,6 +269,7 @@ TEST_F(UsbIpServerTest, StoppedSimulatorHoldsUpNobody) {
         return std::pair(info.usable, info.answers);
     };
     EXPECT_EQ(facts(), std::pair(true, false));
+    const auto device = Open(name_);
     for (int i = 0, file = 0; i < 1000 && file >= 0; ++i) {
         file = Platform::Usb::ConnectToSimulator(name_);
         close(file);
@@ -275,6 +277,7 @@ TEST_F(UsbIpServerTest, StoppedSimulatorHoldsUpNobody) {
     EXPECT_FALSE(Listed(name_)) << "it takes no more connections";
     EXPECT_EQ(facts(), std::pair(false, false));
     close(listener);
+    EXPECT_EQ(Errors::DeviceNotConnected, device->Claim()) << "it has ended";
 }
 
 TEST_F(UsbIpServerTest, AnotherUsersSimulatorIsSeenAndNotUsed) {
@@ -296,6 +299,8 @@ TEST_F(UsbIpServerTest, AnotherUsersSimulatorIsSeenAndNotUsed) {
     EXPECT_EQ(nobody, info.userId);
     EXPECT_EQ(other.Id(), info.processId);
     Open(name_, Errors::AccessDenied);
+    EXPECT_TRUE(Platform::Usb::IsTrustedUser(geteuid()));
+    EXPECT_FALSE(Platform::Usb::IsTrustedUser(nobody));
 }
 
 }  // namespace
