@@ -37,11 +37,7 @@ void PrecisionTime::Set(std::int32_t seconds, std::int32_t microseconds) {
 }
 
 void PrecisionTime::SetToNow() {
-    if (counterFrequency != 0) {
-        SetFromReadings(counterFrequency, Platform::PerformanceCounter(), 0);
-    } else {
-        SetFromReadings(0, 0, Platform::TickCount());
-    }
+    SetFromReadings(counterFrequency, Platform::PerformanceCounter(), Platform::TickCount());
 }
 
 void PrecisionTime::SetFromReadings(std::uint64_t frequency, std::uint64_t counter, std::uint32_t ticks) {
