@@ -219,8 +219,8 @@ Bytes PellandoEEPROM::Dump() try {
     FitSecondLog(*eat_, items);
     Bytes image(Protocol::EepromSize, UnusedByte);
     const auto at = [&image](std::ptrdiff_t address) { return image.begin() + address; };
-    GetLog(true).Dump(at(EepromMap::MainLog), at(EepromMap::LogCopy));
-    GetLog(true).Dump(at(EepromMap::LogCopy), at(EepromMap::EndOfLogArea));
+    currentLog.Dump(at(EepromMap::MainLog), at(EepromMap::LogCopy));
+    currentLog.Dump(at(EepromMap::LogCopy), at(EepromMap::EndOfLogArea));
     eat_->Dump(at(EepromMap::Table), at(EepromMap::Calibration));
     calibration_.Dump(at(EepromMap::Calibration), image.end(), true, true);
     return image;
