@@ -84,7 +84,6 @@ const char* b5ae189db26b2a1b(const char* key) {
             }
         }
     } catch (...) {  // no memory for the text: an empty one is all there is
-        infoResult.clear();
     }
     return infoResult.c_str();
 }
