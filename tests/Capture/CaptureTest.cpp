@@ -1,15 +1,10 @@
 // What a recording holds, byte by byte, where tools that read pcapng and usbmon look for it.
-#include <gtest/gtest.h>
 
-#include <chrono>
-#include <string>
 #include <tuple>
-#include <vector>
 
 #include "Capture/DescribeRequest.h"
 #include "Capture/PcapngWriter.h"
 #include "Capture/UsbCapture.h"
-#include "Protocol/ByteOrder.h"
 #include "Support/HookedUsb.h"
 #include "Support/TestFolder.h"
 #include "Support/TestTransfer.h"
@@ -80,6 +75,7 @@ TEST(CaptureTest, HoldsEveryTransferAsUsbmonDoes) {
     const auto device = std::make_shared<HookedDevice>();
     bus.devices = {{"a", std::make_shared<HookedDevice>()}, {"b", device}};
     Capture::PcapngWriter writer(path, "test 1");
+    EXPECT_FALSE(ReadFile(path).empty()) << "who watches it grow sees its beginning at once";
     Capture::CapturingBus recorded(bus);
     Platform::ErrorCode error = 0;
     EXPECT_EQ(recorded.Open("b", error), device);
@@ -113,6 +109,13 @@ TEST(CaptureTest, HoldsEveryTransferAsUsbmonDoes) {
         EXPECT_EQ(captured->Submit(refused), code);
         EXPECT_EQ(refused.completions, 0);
     }
+    TestTransfer early = TestTransfer::In(Protocol::BulkInEndpoint, 1);
+    device->onSubmit = [&](Transfer&) {
+        captured->Cancel(early);  // before the device has it
+        return Platform::Errors::Success;
+    };
+    EXPECT_EQ(captured->Submit(early), 0U);
+    EXPECT_EQ(early.status, TransferStatus::Cancelled);
     const TestTransfer direct = TestTransfer::In(Protocol::BulkInEndpoint, 1);
     writer.Write({0x500000007, false, 127, &direct, "words"});
     EXPECT_FALSE(writer.Failed());
@@ -141,6 +144,8 @@ TEST(CaptureTest, HoldsEveryTransferAsUsbmonDoes) {
               "9 C 03 82 2/1 2D 3C -71 0 0 [00 00 00 00 00 00 00 00] \n"
               "10 S 03 82 2/1 2D 3C -115 1 0 [00 00 00 00 00 00 00 00] \n"
               "10 C 03 82 2/1 2D 3C -108 0 0 [00 00 00 00 00 00 00 00] \n"
+              "11 S 03 82 2/1 2D 3C -115 1 0 [00 00 00 00 00 00 00 00] \n"
+              "11 C 03 82 2/1 2D 3C -104 0 0 [00 00 00 00 00 00 00 00] \n"
               "21474836487 S 03 82 127/1 2D 3C -115 1 0 [00 00 00 00 00 00 00 00] ; words\n");
     EXPECT_TRUE(Capture::PcapngWriter(folder.Path("none/capture"), "test").Failed());
 }
@@ -149,8 +154,8 @@ TEST(DescribeRequestTest, SaysWhatTheBytesMean) {
     for (const auto& [request, size, text] : std::vector<std::tuple<int, std::size_t, std::string>>{
              {0xA0, 8, "DownloadRAMFirmware address=0x20AB"},
              {0xC2, 8, "GetMeasureParameters p1=258 p2=772 p3=1286 p4=7 p5=8"},
-             {0xC2, 7, "GetMeasureParameters p1=258 p2=772 p3=1286 p4=7"},
-             {0xC4, 5, "ReadEEPROM address=16909060"},
+             {0xC1, 7, "SetMeasureParameters p1=258 p2=772 p3=1286 p4=7"},
+             {0xC4, 6, "ReadEEPROM address=16909060 length=1286"},
              {0xC7, 6, "WriteCPLD c1=258 c2=772 c3=1286"},
              {0xC8, 2, "ReadCPLD value=258"},
              {0xC9, 8, "GetMISC m1=7 m2=258 m3=8 m4=772 m5=1286"},

@@ -50,6 +50,9 @@ TEST(EndianConversion, TakesSignedShorts) {
     Bytes bytes(2);
     Utilities::EndianConversion::ShortToByteArray(std::int16_t{-2}, bytes.data(), true);
     EXPECT_EQ(bytes, (Bytes{0xFF, 0xFE}));
+    std::int16_t value = 0;
+    Utilities::EndianConversion::ByteArrayToShort(bytes.data(), value, true);
+    EXPECT_EQ(value, -2);
 }
 
 TEST(Property, BytesRefillTheValueAndKeepTheType) {
