@@ -1,5 +1,4 @@
 #include <atomic>
-#include <utility>
 
 #include "DeviceDriver/Ostra/LowLevel/Win32/InterruptListener.h"
 #include "DeviceDriver/Ostra/LowLevel/Win64/InterruptListener_Win64.h"
@@ -177,9 +176,10 @@ TYPED_TEST(InterruptListeners, AreNotHeldUpByAReceiverOrADriverThatDoesNotReturn
         watch.ExpectAtMost(11'000);
         EXPECT_FALSE(TypeParam::IsUsbIo && pipe->IsOpen());
         SignalEvent(release.Get());
-        listener->ClearListener();  // over USBIO, after the message where the thread could not be ended
         SleepMilliseconds(10);
         EXPECT_EQ(receiver.Codes().size(), byDriver ? 0U : 1U) << "what comes behind the end is no news";
+        listener
+            ->ClearListener();  // which whoever held it up no longer does, even where it was ended by force
     }
 }
 
