@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <memory>
-#include <string>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
@@ -87,6 +86,7 @@ TEST_F(EepromTest, LoadFillsSetsByNameOrByIdentifier) {
     for (const auto& [name, entries, first, last] : cases) {
         Properties named(name);
         EXPECT_EQ(&eeprom_->Load(named), &named);
+        EXPECT_EQ(named.GetName(), first == 1000 ? name : "");
         ASSERT_EQ(named.GetItemCount(), entries) << name;
         EXPECT_EQ(named.GetPropertyKeys().front(), first);
         EXPECT_EQ(named.GetPropertyKeys().back(), last);
@@ -120,9 +120,10 @@ TEST_F(EepromTest, StoreObeysItsRequests) {
         EXPECT_EQ(set_.Contains(20001) ? set_.GetProperty(20001).AsLong() : -1, writeThroughAfterwards);
         ExpectLocked();
     }
+    eeprom_->SetProperty(10001, Property(1.0F));
     Store({{10002, 5}, {20002, 1}});
     for (const std::size_t copy : {0U, 2048U}) {
-        EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[copy]), 5U);
+        EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[copy]), 0x3F800005U);
         EXPECT_EQ(Protocol::LoadBig32(&instrument_.eeprom[copy + 8]), 5U);
     }
     EXPECT_EQ(eeprom_->Load(1211).AsLong(), 5);

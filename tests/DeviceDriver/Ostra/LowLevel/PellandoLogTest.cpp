@@ -5,7 +5,6 @@
 #include "DeviceDriver/Ostra/LowLevel/PellandoEAT.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoLog.h"
 #include "FreshEeprom.h"
-#include "Protocol/ByteOrder.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 namespace {
@@ -13,42 +12,16 @@ namespace {
 using namespace Generic::Configuration;
 using Bytes = std::vector<std::uint8_t>;
 
-constexpr std::size_t MainCopy = 0;
-constexpr std::size_t SecondCopy = 2048;
-
 class LogTest : public testing::Test {
   protected:
     LogTest() { table_.InitializeEmtpyEAT(); }
 
     PellandoLog Read() const { return PellandoLog(table_, image_.begin()); }
-    void Store(std::size_t address, std::uint32_t value) { Protocol::StoreBig32(&image_[address], value); }
 
     PellandoEAT table_;
     Bytes image_ = Simulator::FreshEeprom();
     Bytes dumped_ = Bytes(1064);
 };
-
-TEST_F(LogTest, ValidCopyIsChosenMainCopyFirst) {
-    // What 10002 is: 5 in the main copy and 6 in the second.
-    const std::vector<std::tuple<const char*, std::uint32_t, std::uint32_t, std::int32_t>> cases{
-        {"both right", 5, 6, 5}, {"main wrong", 4, 6, 6}, {"second wrong", 5, 7, 5}, {"both wrong", 0, 0, 0}};
-    Store(MainCopy + 4, 0x3F800000);
-    Store(MainCopy + 8, 5);
-    Store(MainCopy + 28, 0xC0800000);  // the second element of 10010, with which the sum begins anew
-    Store(SecondCopy + 8, 6);
-    for (const auto& [name, mainChecksum, secondChecksum, expected] : cases) {
-        SCOPED_TRACE(name);
-        Store(MainCopy, mainChecksum);
-        Store(SecondCopy, secondChecksum);
-        const PellandoLog log = Read();
-        EXPECT_EQ(log.GetItem(10002).AsLong(), expected);
-        EXPECT_EQ(log.GetItem(10001).AsFloat(), expected == 5 ? 1.0F : 0.0F);
-        EXPECT_TRUE(log.HasValidChecksum());
-        EXPECT_EQ(log.GetItems().GetPropertyKeys(), PellandoEAT::GetDefaultLogData().GetPropertyKeys());
-        EXPECT_EQ(log.SizeOf(), 1064U);
-        EXPECT_FALSE(log.IsDumpRecommended());
-    }
-}
 
 TEST_F(LogTest, DumpIsRecommendedAfterTheLastWatchedItem) {
     const std::vector<std::uint16_t> watched{10010, 10011, 10012, 10013, 10020, 10021};
