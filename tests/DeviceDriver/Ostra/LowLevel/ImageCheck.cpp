@@ -2,7 +2,6 @@
 
 #include <optional>
 #include <stdexcept>
-#include <utility>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
@@ -12,7 +11,6 @@
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
 
 namespace EepromMap = Protocol::EepromMap;
-using Generic::Configuration::Properties;
 using Generic::Configuration::Property;
 using Generic::Utilities::DataException;
 using Varnholt::Utilities::Exceptions::ResourceException;
@@ -31,29 +29,10 @@ bool IsDocumented(const std::exception& exception) {
             text == "Configuration data dump target too small");
 }
 
-Bytes BytesOf(PellandoEEPROM& eeprom, const char* section) {
-    Properties set(section);
-    eeprom.Load(set);
-    Bytes bytes(set.SizeOf(false));
-    set.Dump(bytes.begin(), bytes.end(), false, true);
-    return bytes;
-}
-
-using Values = std::pair<Bytes, Bytes>;  // of calibration and log
-
-Values ValuesOf(PellandoEEPROM& eeprom) {
-    return {BytesOf(eeprom, "CalibrationData"), BytesOf(eeprom, "LogData")};
-}
-
-Values ValuesIn(const Bytes& image) {
-    return ValuesOf(Service::ImageModel(image).Get());
-}
-
-/// Whether the image's table finds the model's values of a section from `start` on.
-bool Locates(const Bytes& image, PellandoEEPROM& eeprom, const char* section, std::uint32_t start,
-             std::uint16_t idOffset = 0) {
-    Properties values(section);
-    return PellandoEAT(image.begin() + EepromMap::Table).Locates(eeprom.Load(values), start, idOffset);
+bool ReadsAs(const Bytes& image, Service::ImageModel& expected) {
+    Service::ImageModel read(image);
+    return Service::HaveSameBytes(read.Calibration(), expected.Calibration()) &&
+           Service::HaveSameBytes(read.Log(), expected.Log());
 }
 
 Property Resized(Property value, std::uint16_t elements) {
@@ -78,20 +57,19 @@ bool RoundTrips(const Bytes& image, const std::vector<Resize>& resizes) {
         }
         throw;
     }
-    PellandoEEPROM& eeprom = model->Get();
-    if (!Locates(dumped, eeprom, "LogData", EepromMap::MainLog) ||
-        !Locates(dumped, eeprom, "CalibrationData", EepromMap::Calibration)) {
+    const PellandoEAT table = Service::TableOf(dumped);
+    if (!table.Locates(model->Log(), EepromMap::MainLog, 0) ||
+        !table.Locates(model->Calibration(), EepromMap::Calibration, 0)) {
         return false;
     }
-    const Values expected = ValuesOf(eeprom);  // behind the dump, which renews the checksum
-    if (ValuesIn(dumped) != expected) {
+    if (!ReadsAs(dumped, *model)) {
         throw std::logic_error("the dump reads differently");
     }
-    if (!Locates(dumped, eeprom, "LogData", EepromMap::LogCopy, EepromMap::LogCopyIdOffset)) {
+    if (!table.Locates(model->Log(), EepromMap::LogCopy, EepromMap::LogCopyIdOffset)) {
         return false;
     }
     dumped[EepromMap::MainLog] = static_cast<std::uint8_t>(~dumped[EepromMap::MainLog]);
-    if (ValuesIn(dumped) != expected) {
+    if (!ReadsAs(dumped, *model)) {
         throw std::logic_error("the dump's second log reads differently");
     }
     return true;

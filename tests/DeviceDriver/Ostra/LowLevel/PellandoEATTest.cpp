@@ -1,4 +1,3 @@
-#include <gtest/gtest.h>
 
 #include <limits>
 #include <map>
@@ -13,6 +12,7 @@
 #include "FreshEeprom.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/EepromMap.h"
+#include "Service/Memory/ImageModel.h"
 #include "Support/ExpectThrow.h"
 
 namespace Varnholt::DeviceDriver::Ostra::LowLevel {
@@ -60,20 +60,12 @@ class FreshTable : public testing::Test {
 };
 
 TEST_F(FreshTable, IsTheOneOfAFreshInstrumentByteForByte) {
-    Bytes image(Protocol::EepromSize, 0xFF);
-    const auto at = [&image](std::uint32_t address) {
-        return image.begin() + static_cast<std::ptrdiff_t>(address);
-    };
-    for (const std::uint32_t copy : {EepromMap::MainLog, EepromMap::LogCopy}) {
-        PellandoEAT::GetDefaultLogData().Dump(at(copy), image.end(), true, true);
-    }
-    table_.Dump(at(EepromMap::Table), at(EepromMap::Calibration));
-    PellandoEAT::GetDefaultCalibrationData().Dump(at(EepromMap::Calibration), image.end(), true, true);
-    EXPECT_EQ(image, image_);
-    EXPECT_EQ(EntriesOf(PellandoEAT(image.begin() + EepromMap::Table)), fresh_);
+    EXPECT_EQ(Service::FreshImage(), image_);
+    EXPECT_EQ(EntriesOf(PellandoEAT(image_.begin() + EepromMap::Table)), fresh_);
+    Bytes bytes(4);
+    EXPECT_NO_THROW(PellandoEAT().Dump(bytes.begin(), bytes.end())) << "a header alone";
     ExpectThrow<ResourceException>("Configuration data dump target too small",
-                                   [&] { table_.Dump(at(0), at(3)); });
-    EXPECT_NO_THROW(PellandoEAT().Dump(at(0), at(4))) << "a header alone";
+                                   [&] { table_.Dump(bytes.begin(), bytes.end() - 1); });
 }
 
 TEST_F(FreshTable, SizeIsTheDistanceToTheNextEntry) {
