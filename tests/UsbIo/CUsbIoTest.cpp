@@ -1,9 +1,7 @@
 #include <array>
 #include <cstdio>
 #include <span>
-#include <string>
 
-#include "Platform/CallFilter.h"
 #include "Protocol/Instrument.h"
 #include "Support/DriverTest.h"
 #include "UsbIo/CUsbIoPipe.h"
@@ -184,11 +182,6 @@ class CUsbIoPipeTest : public Tests::DriverTest {
         ASSERT_EQ(pipe_.Bind(0, BulkInEndpoint, nullptr, nullptr), Status::Success);
         driver_.TakeTranscript();
     }
-    /// Starts a read that fills the buffer.
-    void StartRead(CUsbIoBuffer& buffer) {
-        buffer.NumberOfBytesToTransfer = buffer.Size;
-        ASSERT_TRUE(pipe_.Read(buffer));
-    }
 
     CUsbIoPipe pipe_;
 };
@@ -238,7 +231,8 @@ TEST_F(CUsbIoPipeTest, AnEventEndsTheWaitButNotTheTransfer) {
     const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
     driver_.Script(BulkInEndpoint, {.data = {5}, .after = 80});
     CUsbIoBuffer buffer(8);
-    StartRead(buffer);
+    buffer.NumberOfBytesToTransfer = buffer.Size;
+    ASSERT_TRUE(pipe_.Read(buffer));
     EXPECT_EQ(buffer.Status, Pending);
     EXPECT_EQ(pipe_.WaitForCompletion(buffer, 0), Status::TimedOut);
     Platform::SignalEvent(event.Get());
@@ -246,13 +240,6 @@ TEST_F(CUsbIoPipeTest, AnEventEndsTheWaitButNotTheTransfer) {
     EXPECT_EQ(buffer.Status, Pending);
     EXPECT_EQ(pipe_.WaitForCompletion(buffer, Platform::Infinite, event.Get()), Status::Success);
     EXPECT_EQ(buffer.BytesTransferred, 1U);
-}
-
-TEST_F(CUsbIoPipeTest, ACancelledTransferIsAborted) {
-    CUsbIoBuffer buffer(8);
-    StartRead(buffer);
-    pipe_.CancelToCompletion(buffer);
-    EXPECT_EQ(pipe_.WaitForCompletion(buffer, 0), Platform::Errors::OperationAborted);
 }
 
 TEST_F(CUsbIoPipeTest, RefusesTransfersThatCannotBeRight) {

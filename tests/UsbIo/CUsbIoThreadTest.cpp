@@ -1,7 +1,6 @@
 #include <algorithm>
 #include <atomic>
 
-#include "Platform/CallFilter.h"
 #include "Protocol/Instrument.h"
 #include "Support/DriverTest.h"
 #include "UsbIo/CUsbIoReader.h"
