@@ -100,7 +100,8 @@ TEST_P(ScanTest, OtherRecordSizes) {
 /// What cannot be written is not taken for data that did not come.
 TEST_P(ScanTest, ToAFullDisk) {
     host_.Add("sim", Streaming(100'000));
-    Fail("scan --raw --record-size 1000 --total 100000 --output /dev/full", ExitCode::File, "/dev/full");
+    Fail("scan --raw --record-size 1000 --total 100000 --output /dev/full", ExitCode::File,
+         "ostra: cannot write /dev/full");
 }
 #endif
 

@@ -34,7 +34,7 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
     for (const Case& row : {
              Case{"nothing", false, none, "np", "no device with either driver", "look at its cable",
                   NotFound},
-             {"own driver", false, native, "ng", "native/a answers"},
+             {"own driver", false, native, "ng", "native/a answers (firmware 258)"},
              {"USBIO", true, {"usbio/a", "usbio/b"}, "ngg", "usbio/b answers"},
              {"own driver only", true, native, "np",
               "has the instrument's own driver, which is not used here: ",
@@ -63,9 +63,8 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
         for (int opening = 0; opening < 10; ++opening) {
             driver.Script(Protocol::UsbIoDriver::Control::GetDriverInfo, {.data = information});
         }
-        if (row.isSilent) {
-            driver.Script(0, {.after = Never});
-        }
+        driver.Script(0, {.after = row.isSilent ? Never : 0U});
+        driver.Script(0, {.data = Counting(8, 1)});
         FailCalls("LoadEnumeration", row.enumeration);
         Service::Observer nobody;
         Service::Interruption never;
