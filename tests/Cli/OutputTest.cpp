@@ -1,4 +1,3 @@
-#include <gtest/gtest.h>
 #if !defined(_WIN32)
 #include <sys/resource.h>
 #endif
@@ -7,7 +6,6 @@
 #include <csignal>
 #include <cstdlib>
 #include <limits>
-#include <sstream>
 
 #include "Output/Json.h"
 #include "Output/LiveBlock.h"
@@ -190,26 +188,6 @@ TEST_F(FileTest, ARecordingLeavesToOthersWhatIsTheirs) {
 }
 
 #if !defined(_WIN32)
-/// Files of this process cannot grow beyond 14 bytes, as on a full disk.
-class FullDisk final {
-  public:
-    FullDisk() {
-        ::getrlimit(RLIMIT_FSIZE, &limitBefore_);
-        const rlimit limit{14, limitBefore_.rlim_max};
-        ::setrlimit(RLIMIT_FSIZE, &limit);
-    }
-    ~FullDisk() {
-        ::setrlimit(RLIMIT_FSIZE, &limitBefore_);
-        ::signal(SIGXFSZ, handlerBefore_);
-    }
-    FullDisk(const FullDisk&) = delete;
-    FullDisk& operator=(const FullDisk&) = delete;
-
-  private:
-    rlimit limitBefore_{};
-    void (*const handlerBefore_)(int) = ::signal(SIGXFSZ, SIG_IGN);
-};
-
 TEST_F(FileTest, AFullDiskLeavesTheWholeRecords) {
     using Form = RecordOutput::Form;
     for (const auto& [block, records, form, kept, content] :
@@ -221,12 +199,17 @@ TEST_F(FileTest, AFullDiskLeavesTheWholeRecords) {
          }) {
         SCOPED_TRACE(block);
         RecordingFile file(path_, none_);
-        {
-            const FullDisk full;
-            file.Append(std::string("head\n"), 0);
-            ExpectThrow<FileError>("cannot write " + path_ + ": File too large",
-                                   [&] { file.Append(block, records, form); });
-        }
+        // Files of this process cannot grow beyond 14 bytes, as on a full disk.
+        rlimit before{};
+        ::getrlimit(RLIMIT_FSIZE, &before);
+        const rlimit full{14, before.rlim_max};
+        void (*const handler)(int) = ::signal(SIGXFSZ, SIG_IGN);
+        ::setrlimit(RLIMIT_FSIZE, &full);
+        file.Append(std::string("head\n"), 0);
+        ExpectThrow<FileError>("cannot write " + path_ + ": File too large",
+                               [&] { file.Append(block, records, form); });
+        ::setrlimit(RLIMIT_FSIZE, &before);
+        ::signal(SIGXFSZ, handler);
         EXPECT_EQ(file.Records(), kept);
         EXPECT_EQ(file.KeepWholeRecords().file, kept > 0 ? path_ : "");
         EXPECT_EQ(kept > 0 ? Content("f") : "", content);

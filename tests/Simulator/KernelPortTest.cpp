@@ -1,10 +1,6 @@
 #include <gmock/gmock.h>
 
-#include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <stdexcept>
-#include <string>
 
 #include "KernelPort.h"
 #include "Support/TestFolder.h"
@@ -16,15 +12,14 @@ constexpr const char* Heading = "hub port sta spd dev      sockfd local_busid\n"
 constexpr const char* Attached = " 006 003 00010002 000003 3-1\n";
 constexpr const char* Free = " 004 000 00000000 000000 0-0\n";
 
-class KernelPortTest : public testing::Test {
-  protected:
-    void Write(const std::string& name, const std::string& text) { std::ofstream(files_.Path(name)) << text; }
-
-    const Tests::TestFolder files_;
-    const std::string folder_ = files_.Path("");
-};
-
-TEST_F(KernelPortTest, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
+TEST(KernelPort, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
+    const Tests::TestFolder files;
+    const auto plug = [&files] { return PlugIntoKernel(7, 0x10002, files.Path("")); };
+    const auto write = [&files](const char* name, const std::string& text) {
+        std::ofstream(files.Path(name)) << text;
+    };
+    EXPECT_THAT([&files] { PlugIntoKernel(7, 0x10002, files.Path("missing")); },
+                testing::ThrowsMessage<std::runtime_error>(testing::HasSubstr("modprobe vhci-hcd")));
     const auto port = [](const char* number, bool isFree) {
         return "hs  00" + std::string(number) + (isFree ? Free : Attached);
     };
@@ -35,25 +30,20 @@ TEST_F(KernelPortTest, TakesAFreeHighSpeedPortOfTheLeastUsedController) {
              {port("00", false) + port("01", true), port("30", false), "1 7 65538 3"},
              {"ss  0015" + std::string(Free), port("30", false), ""},
          }) {
-        Write("attach", "");
-        Write("status", Heading + first);
-        Write("status.1", Heading + second);
+        write("attach", "");
+        write("status", Heading + first);
+        write("status.1", Heading + second);
         if (*order == '\0') {
-            EXPECT_THROW(PlugIntoKernel(7, 0x10002, folder_), std::runtime_error);
+            EXPECT_THROW(plug(), std::runtime_error);
             continue;
         }
-        EXPECT_EQ(std::stoul(order), PlugIntoKernel(7, 0x10002, folder_));
-        std::ifstream written(files_.Path("attach"));
+        EXPECT_EQ(std::stoul(order), plug());
+        std::ifstream written(files.Path("attach"));
         EXPECT_EQ(order, std::string(std::istreambuf_iterator<char>(written), {}));
     }
-    std::filesystem::remove(files_.Path("attach"));
-    Write("status", Heading + port("00", true));
-    EXPECT_THROW(PlugIntoKernel(7, 0x10002, folder_), std::runtime_error) << "nothing to write the order to";
-}
-
-TEST_F(KernelPortTest, SaysWhatToDoWhereThereIsNoSuchHost) {
-    EXPECT_THAT([this] { PlugIntoKernel(7, 0x10002, files_.Path("missing")); },
-                testing::ThrowsMessage<std::runtime_error>(testing::HasSubstr("modprobe vhci-hcd")));
+    std::filesystem::remove(files.Path("attach"));
+    write("status", Heading + port("00", true));
+    EXPECT_THROW(plug(), std::runtime_error) << "nothing to write the order to";
 }
 
 }  // namespace

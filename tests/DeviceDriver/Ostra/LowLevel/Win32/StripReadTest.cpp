@@ -1,5 +1,4 @@
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
-#include "Platform/CallFilter.h"
 #include "Platform/Time.h"
 #include "Support/DriverTest.h"
 
@@ -25,16 +24,14 @@ Bytes Content(const ScanRecordList& records, std::uint32_t recordSize) {
 
 class NativeStripRead : public DriverTest {
   protected:
-    NativeStripRead() : DriverTest(TestTime::Virtual) {}
-
-    void SetUp() override {
+    NativeStripRead() : DriverTest(TestTime::Virtual) {
         ObserveBeeps([this](std::uint32_t hertz, std::uint32_t milliseconds) {
             beeps_.push_back(std::to_string(hertz) + "/" + std::to_string(milliseconds));
         });
         WaitUntil([this] { return driver_.Running() == 1; });
         driver_.TakeTranscript();
     }
-    void TearDown() override { ObserveBeeps({}); }
+    ~NativeStripRead() override { ObserveBeeps({}); }
 
     /// "10 50 x": the sizes asked for, and the cancellations.
     std::string TakeReads() {
