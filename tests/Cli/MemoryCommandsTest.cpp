@@ -3,7 +3,6 @@
 #include <unistd.h>
 #endif
 
-#include <numeric>
 #include <regex>
 #include <thread>
 

@@ -1,10 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <numeric>
-#include <string>
 #include <tuple>
-#include <vector>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Protocol/ByteOrder.h"

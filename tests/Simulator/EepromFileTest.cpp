@@ -1,16 +1,12 @@
 #include <gmock/gmock.h>
 
-#include <filesystem>
 #include <memory>
 #include <stdexcept>
-#include <string>
-#include <vector>
 
 #include "EepromFile.h"
 #include "EepromImageFile.h"
 #include "FreshEeprom.h"
 #include "PollLoop.h"
-#include "Protocol/Instrument.h"
 #include "Support/TestFolder.h"
 #include "Support/TestTransfer.h"
 

@@ -1,8 +1,5 @@
-#include <gtest/gtest.h>
 
 #include <memory>
-#include <string>
-#include <vector>
 
 #include "FaultInjector.h"
 #include "Platform/Threads.h"

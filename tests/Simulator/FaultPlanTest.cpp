@@ -1,7 +1,6 @@
 #include <gmock/gmock.h>
 
 #include <stdexcept>
-#include <string>
 #include <utility>
 #include <vector>
 

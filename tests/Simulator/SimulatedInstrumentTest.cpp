@@ -1,7 +1,5 @@
-#include <gtest/gtest.h>
 
 #include "Platform/Threads.h"
-#include "Protocol/ByteOrder.h"
 #include "SchedulerInForce.h"
 #include "SimulatedInstrument.h"
 #include "Support/Bytes.h"

@@ -2,12 +2,9 @@
 // process.
 #include <gmock/gmock.h>
 
-#include <algorithm>
 #include <array>
 #include <cstdlib>
-#include <fstream>
 #include <stdexcept>
-#include <string>
 
 #include "ostra.h"
 #include "SimulatedSetup.h"

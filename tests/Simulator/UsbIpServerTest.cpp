@@ -10,9 +10,6 @@
 #include <future>
 #include <memory>
 #include <stdexcept>
-#include <string>
-#include <thread>
-#include <vector>
 
 #include "Platform/Linux/ForkedProcess.h"
 #include "Platform/UniqueName.h"

@@ -2,8 +2,6 @@
 #include <gtest/gtest.h>
 
 #include <memory>
-#include <string>
-#include <vector>
 
 #include "FaultInjector.h"
 #include "Protocol/Instrument.h"

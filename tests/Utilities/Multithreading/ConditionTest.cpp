@@ -1,13 +1,6 @@
 // Mutexes, semaphores and conditions.
-#include <functional>
 #include <limits>
-#include <memory>
-#include <string>
-#include <thread>
-#include <utility>
-#include <vector>
 
-#include "Platform/CallFilter.h"
 #include "Platform/UniqueName.h"
 #include "Support/DriverTest.h"
 #include "Utilities/Exceptions/Exceptions.h"

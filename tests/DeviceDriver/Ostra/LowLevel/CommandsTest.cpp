@@ -1,6 +1,4 @@
 #include <cstring>
-#include <functional>
-#include <optional>
 #include <sstream>
 
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"

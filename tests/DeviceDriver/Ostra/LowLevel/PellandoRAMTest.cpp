@@ -1,11 +1,8 @@
-#include <gtest/gtest.h>
 
 #include <algorithm>
-#include <array>
 #include <cmath>
 #include <limits>
 #include <sstream>
-#include <string>
 
 #include "DeviceDriver/Ostra/LowLevel/PellandoRAM.h"
 #include "FakeCommands.h"

@@ -1,10 +1,7 @@
 #include <atomic>
-#include <functional>
-#include <thread>
 
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
 #include "DeviceDriver/Ostra/LowLevel/Win32/USBConnection.h"
-#include "Platform/CallFilter.h"
 #include "Protocol/NativeDriver.h"
 #include "Support/DriverTest.h"
 #include "Utilities/Multithreading/Mutex.h"
