@@ -36,16 +36,22 @@ TEST_P(Interruptions, RefuseAtOnceWhatBeginsBehindThem) {
 TEST_P(Interruptions, AbortThePipesOnWhichTransfersRun) {
     using Platform::Operation;
     std::string told;
-    Service::InterruptibleDeviceFiles files(driver_, [&](const std::string& line) { told += line; });
+    Service::InterruptibleDeviceFiles files(driver_, [&](const std::string& line) {
+        told += line;
+        Platform::SetLastError(Platform::Errors::Success);
+    });
     const auto open = [&](std::size_t device, const std::string& pipe) {
         return files.Open(Paths(2)[device] + (IsNative() ? "\\PIPE0" + pipe : ""));
     };
-    files.Open(Paths(2)[0]);
+    driver_.CloseFile(files.Open(Paths(2)[0]));  // nothing is sent to the other device
     files.Open(Paths(2)[1]);
     const auto idle = open(1, "1"), busy = open(1, "2");
     const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
     Platform::Overlapped record{.event = event.Get()};
     Bytes data(4);
+    driver_.Script(IsNative() ? 2 : 0, {.refusal = Platform::Errors::Busy});
+    EXPECT_FALSE(files.Start(busy, Operation::Write(data.data(), 4), record));
+    EXPECT_EQ(std::exchange(told, ""), "bulk out 0 of 4: failed with code 0xAA");
     driver_.Script(IsNative() ? 2 : 0, {.after = Never});
     files.Start(busy, Operation::Write(data.data(), 4), record);
     files.CloseFile(idle);
@@ -61,6 +67,7 @@ TEST_P(Interruptions, AbortThePipesOnWhichTransfersRun) {
     files.CancelTransfers(busy);
     std::uint32_t moved = 0;
     EXPECT_FALSE(files.GetResult(busy, record, moved, false));
+    EXPECT_EQ(Platform::LastError(), Platform::Errors::OperationAborted);
     EXPECT_EQ(told, "bulk out 0 of 4: cancelled");
 }
 

@@ -121,6 +121,10 @@ TEST_F(CUsbIoTest, AFailedOpenLeavesTheObjectClosed) {
 TEST_F(CUsbIoTest, SendsTheDriversRecords) {
     CUsbIo device;
     ASSERT_EQ(Open(device), Status::Success);
+    driver_.Script(Control::GetDeviceParameters, {.data = Counting(8, 1)});
+    DeviceParameters parameters;
+    EXPECT_EQ(device.GetDeviceParameters(parameters), 0U);
+    EXPECT_EQ(parameters.words[1], 0x08070605U);
     driver_.TakeTranscript();
 
     const std::array<InterfaceSetting, 2> interfaces{{{0, 1, 65536}, {0x0203, 0x0405, 0x06070809}}};
@@ -240,6 +244,8 @@ TEST_F(CUsbIoPipeTest, AnEventEndsTheWaitButNotTheTransfer) {
     EXPECT_EQ(buffer.Status, Pending);
     EXPECT_EQ(pipe_.WaitForCompletion(buffer, Platform::Infinite, event.Get()), Status::Success);
     EXPECT_EQ(buffer.BytesTransferred, 1U);
+    driver_.Script(BulkInEndpoint, {});
+    EXPECT_TRUE(pipe_.Read(buffer)) << "that is over at once";
 }
 
 TEST_F(CUsbIoPipeTest, RefusesTransfersThatCannotBeRight) {
