@@ -149,6 +149,9 @@ TEST_F(FileTest, AnAtomicFileTakesItsNameWhenItIsComplete) {
     WriteFile(folder_.Path("new"), {7});  // somebody was faster
     EXPECT_THROW(file.Commit(), FileError);
     EXPECT_EQ(Content("new"), "\x07");
+    AtomicFile hidden(folder_.Path("hidden"));
+    std::filesystem::create_directory(folder_.Path("hidden"));
+    EXPECT_THROW(hidden.Commit(), FileError);
     for (const std::string& name : {folder_.Path(""), folder_.Path("missing/file")}) {
         EXPECT_THAT([&] { AtomicFile impossible(name); },
                     testing::ThrowsMessage<FileError>(testing::HasSubstr(name)));
