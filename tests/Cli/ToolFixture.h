@@ -5,8 +5,6 @@
 #include <functional>
 #include <nlohmann/json.hpp>
 #include <sstream>
-#include <string>
-#include <vector>
 
 #include "Support/SimulatedHost.h"
 #include "Support/TestClock.h"

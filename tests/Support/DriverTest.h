@@ -2,15 +2,10 @@
 
 #include <gmock/gmock.h>
 
-#include <functional>
-#include <mutex>
-#include <string>
 #include <utility>
-#include <vector>
 
 #include "DeviceDriver/Generic/EventListener.h"
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
-#include "Platform/EventScheduler.h"
 #include "Platform/HostQueries.h"
 #include "Platform/TestThread.h"
 #include "Platform/Threads.h"

@@ -7,10 +7,7 @@
 #include <functional>
 #include <memory>
 #include <mutex>
-#include <numeric>
-#include <string>
 #include <utility>
-#include <vector>
 
 #include "Platform/Usb/UsbDevice.h"
 #include "Protocol/Instrument.h"

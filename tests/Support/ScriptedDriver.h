@@ -1,15 +1,12 @@
 #pragma once
 
-#include <cstdint>
 #include <deque>
 #include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
 #include <optional>
-#include <string>
 #include <thread>
-#include <vector>
 
 #include "Platform/DeviceFiles.h"
 #include "Platform/EventScheduler.h"
