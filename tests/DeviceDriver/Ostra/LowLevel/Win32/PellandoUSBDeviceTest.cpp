@@ -168,12 +168,12 @@ TEST_F(NativeDevice, TakesTheDeviceLockForEveryTransfer) {
     ScanRecordList records;
     std::uint8_t byte = 0;
     const std::function<void()> operations[] = {
+        [&] { device->MessageFromDevice(MessageButtonData, 0); },
         [&] { device->PerformDeviceIOControl({}, nullptr, 0); },
         [&] { ReadOneByte(*device); },
         [&] { device->WriteData(&byte, 1, 0); },
         [&] { device->ReadDataStrip(records, 1, 0); },
         [&] { device->ReadDataCountedStrip(records, 1, 0, 1); },
-        [&] { device->MessageFromDevice(MessageButtonData, 0); },
         [&] { device->RemoveListener(&listener_); },
     };
     for (const auto& operation : operations) {
