@@ -245,7 +245,7 @@ void LibUsbDevice::Completed(libusb_transfer* transfer) {
 
 void LibUsbDevice::Complete(Submission& submission) {
     Transfer& transfer = *submission.owner;
-    const std::uint32_t moved = static_cast<std::uint32_t>(std::max(submission.transfer->actual_length, 0));
+    const auto moved = static_cast<std::uint32_t>(submission.transfer->actual_length);
     transfer.actualLength = std::min(moved, transfer.length);
     transfer.status = StatusFromLibUsb(submission.transfer->status);
     if (transfer.endpoint == 0 && transfer.IsIn()) {
