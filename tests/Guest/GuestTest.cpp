@@ -1,22 +1,14 @@
 // The library on a real Linux kernel: runs inside the virtual machine, where ostra-simulator plugs itself
 // into the kernel's virtual USB host. Everything goes through usbfs and libusb.
 #include <gmock/gmock.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <array>
 #include <atomic>
-#include <chrono>
-#include <cstddef>
 #include <cstdio>
 #include <cstdlib>
-#include <fstream>
-#include <functional>
-#include <iterator>
 #include <optional>
 #include <span>
-#include <thread>
-#include <vector>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"

@@ -22,13 +22,6 @@ TEST_P(Threads, RememberTheirPriority) {
     EXPECT_EQ(CurrentThreadPriority(), 0);
 }
 
-TEST_P(Threads, HaveTheirOwnLastError) {
-    SetLastError(Errors::Busy);
-    TestThread([] { EXPECT_EQ(ErrorOf(SignalEvent(NoHandle)), Errors::InvalidHandle); }).Join();
-    SleepMilliseconds(1);
-    EXPECT_EQ(LastError(), Errors::Busy);
-}
-
 TEST(ThreadsOfTheHost, AbandonWhatTheyOwnAtTheirEnd) {
     const OwnedHandle mutex(MakeMutex(""));
     std::thread([&] { Wait(mutex.Get(), 0); }).join();

@@ -7,6 +7,7 @@
 #include "EachClock.h"
 #include "Platform/Threads.h"
 #include "Platform/Time.h"
+#include "Platform/WaitableObjects.h"
 
 namespace Varnholt::Platform {
 namespace {
@@ -14,12 +15,15 @@ namespace {
 using Clocks = EachClock;
 INSTANTIATE_FOR_EACH_CLOCK(Clocks);
 
-TEST_P(Clocks, AgreeOnASleep) {
+TEST_P(Clocks, AgreeOnASleepAndOnWaitsInVain) {
     const std::uint64_t counter = PerformanceCounter();
     const std::uint32_t ticks = TickCount();
     const WallTime wall = WallClockNow();
     const std::uint64_t scheduler = ClockScheduler().Now();
-    SleepMilliseconds(200);
+    const OwnedHandle event(MakeAutoResetEvent());
+    SleepMilliseconds(80);
+    EXPECT_EQ(Wait(event.Get(), 60), WaitResult::TimedOut);
+    EXPECT_EQ(WaitAny(std::array{event.Get()}, 60).result, WaitResult::TimedOut);
     const WallTime wallAfter = WallClockNow();
     const auto counted = static_cast<double>(PerformanceCounter() - counter);
     const double byCounter = counted * 1000 / static_cast<double>(PerformanceFrequency());

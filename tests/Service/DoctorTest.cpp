@@ -107,7 +107,7 @@ TEST(DoctorTest, NamesTheReasonAndTheFix) {
              {"a kernel driver",
               With(Plugged("cdc_acm")),
               "ng",
-              "the kernel driver cdc_acm holds its interface",
+              "kernel driver cdc_acm holds its",
               "",
               {},
               1},

@@ -3,7 +3,6 @@
 #include "Platform/HostQueries.h"
 #include "Protocol/ByteOrder.h"
 #include "Protocol/UsbIoDriver.h"
-#include "Service/Finding.h"
 #include "Support/FailCalls.h"
 #include "Support/ScriptedDriver.h"
 #include "Support/TestClock.h"

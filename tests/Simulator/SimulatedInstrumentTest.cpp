@@ -113,22 +113,6 @@ TEST_F(SimulatedInstrumentTest, HaltedEndpointStallsUntilCleared) {
     }
 }
 
-TEST_F(SimulatedInstrumentTest, DescriptorsAreWhatAnOperatingSystemExpects) {
-    const auto get = [this](std::uint16_t value, std::uint16_t length) {
-        return Do(TestTransfer::Control({0x80, 6, value, 0, length}, Bytes(length)));
-    };
-    const Bytes device = get(0x0100, 64);
-    ASSERT_EQ(18U, device.size());
-    EXPECT_EQ(18, device[0]);
-    const Bytes configuration = get(0x0200, 255);
-    ASSERT_EQ(9U + 9U + 3 * 7U, configuration.size());
-    EXPECT_EQ(configuration.size(), Protocol::LoadLittle16(&configuration[2]));
-    EXPECT_EQ(
-        (Bytes{7, 5, 0x03, 2, 0x00, 0x02, 0, 7, 5, 0x82, 2, 0x00, 0x02, 0, 7, 5, 0x84, 3, 0x08, 0x00, 4}),
-        Bytes(configuration.begin() + 18, configuration.end()));
-    EXPECT_EQ((Bytes{16, 3, 'S', 0, 'I', 0, 'M', 0, '0', 0, '0', 0, '0', 0, '1', 0}), get(0x0303, 255));
-}
-
 TEST_F(SimulatedInstrumentTest, UnplugLosesWhatIsVolatile) {
     Do(TestTransfer::Vendor(Request::SetMeasureParameters, Bytes(8, 9)));
     Do(TestTransfer::Memory(Request::WriteEeprom, 100, 1));

@@ -3,10 +3,8 @@
 #include <gtest/gtest.h>
 #include <poll.h>
 #include <sys/socket.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <functional>
 #include <future>
 #include <memory>
 #include <stdexcept>

@@ -76,31 +76,6 @@ TEST_F(OverlappedFiles, ARequestThatHasFailedEndsWithoutCancellingOthers) {
     EXPECT_EQ(device_->cancellations, 0);
 }
 
-// The signal of a shared event says that one of its requests has ended, not which.
-TEST_F(OverlappedFiles, WaitForTheirOwnEndWhereAnEventIsShared) {
-    const auto interruptPipe = OpenPipe(Native::InterruptPipe);
-    for (const bool eventTaken : {false, true}) {
-        Bytes interrupt(8);
-        Request reading, listening;
-        listening.record.event = reading.record.event;
-        StartPending(pipe_, buffer_, reading);
-        StartPending(interruptPipe, interrupt, listening);
-        std::thread completer([&] {
-            for (const std::uint8_t endpoint : {Protocol::InterruptInEndpoint, In}) {
-                device_->Send(endpoint, {2, 3});
-                if (eventTaken) {
-                    Platform::Wait(reading.event.Get(), 1000);
-                }
-                Platform::SleepMilliseconds(5);
-            }
-        });
-        EXPECT_EQ(Result(pipe_, reading, true), (Outcome{0, 2}));
-        EXPECT_EQ(Result(interruptPipe, listening, true), (Outcome{0, 2}));
-        completer.join();
-        EXPECT_EQ(reading.TakeSignal(), !eventTaken) << "the wait takes no signal from its caller";
-    }
-}
-
 TEST_F(OverlappedFiles, CancelOnlyWhatTheCallerStartedOnTheFile) {
     const Platform::Handle files[] = {pipe_, pipe_, OpenPipe(1), OpenPipe(3)};
     Bytes buffers[4] = {Bytes(8), Bytes(8), Bytes(8), Bytes(8)};

@@ -1,4 +1,3 @@
-#include <gtest/gtest.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 

@@ -1,13 +1,6 @@
-#include <gtest/gtest.h>
 #include <libusb-1.0/libusb.h>
 
-#include <memory>
-#include <thread>
-
-#include "Platform/EventScheduler.h"
-#include "Platform/TestThread.h"
 #include "Platform/Usb/LibUsbEvents.h"
-#include "Platform/WaitableObjects.h"
 #include "Support/DriverTest.h"
 #include "Support/SignalMasks.h"
 

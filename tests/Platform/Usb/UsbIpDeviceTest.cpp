@@ -1,14 +1,8 @@
 // The USB/IP client against a peer that the test plays.
-#include <gtest/gtest.h>
 #include <sys/socket.h>
 #include <sys/time.h>
-#include <unistd.h>
 
-#include <algorithm>
-#include <chrono>
 #include <optional>
-#include <thread>
-#include <vector>
 
 #include "Platform/Usb/UsbIpDevice.h"
 #include "Platform/Usb/UsbIpProtocol.h"

@@ -1,9 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <string>
 #include <utility>
-#include <vector>
 
 #include "Platform/Usb/UsbDescriptors.h"
 #include "Platform/Usb/UsbIpProtocol.h"
