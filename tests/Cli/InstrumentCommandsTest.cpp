@@ -242,6 +242,7 @@ TEST_P(InstrumentCommandsTest, InstrumentsAreNamedByTheEndOfTheirIdentifier) {
     host_.Add("left");
     host_.Add("right");
     Fail("identify --device up", ExitCode::NoInstrument, Identifier("right"));
+    Fail("identify --device t", ExitCode::NoInstrument, "name one of them: " + Identifier("left") + ", ");
     EXPECT_EQ(JsonOf("identify --json")["name"], "left");
     EXPECT_THAT(tool_.Err(), HasSubstr("taking " + Identifier("left")));
     for (const std::string& line : std::vector<std::string>{

@@ -379,7 +379,7 @@ TEST_P(RamTest, TimesFollowTheModeThatTheInstrumentIsIn) {
 
 TEST_P(RamTest, TimesThatNoModeCountsAreExplained) {
     auto& instrument = host_.Add("sim");
-    Succeed("ram set 2009=0.005");
+    Succeed("ram set 2009=0.005 9189=0");
     const std::string modes =
         "\n       mode 1: 0.00884 s to 4.45638 s; mode 2: 0.00442 s to 2.22819 s; mode 3: 0.001 s to 0.65535 "
         "s\n";

@@ -99,9 +99,10 @@ TEST_P(ScanTest, OtherRecordSizes) {
 #if !defined(_WIN32)
 /// What cannot be written is not taken for data that did not come.
 TEST_P(ScanTest, ToAFullDisk) {
-    host_.Add("sim", Streaming(100'000));
+    auto& instrument = host_.Add("sim", Streaming(100'000));
     Fail("scan --raw --record-size 1000 --total 100000 --output /dev/full", ExitCode::File,
          "ostra: cannot write /dev/full");
+    EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 2U);
 }
 #endif
 

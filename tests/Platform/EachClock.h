@@ -1,8 +1,5 @@
 #pragma once
 
-#include <gtest/gtest.h>
-
-#include <optional>
 #include <string>
 
 #include "Support/TestClock.h"

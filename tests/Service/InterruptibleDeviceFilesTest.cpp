@@ -1,6 +1,7 @@
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
 #include "Platform/Owned.h"
 #include "Service/InterruptibleDeviceFiles.h"
+#include "Service/Interruption.h"
 #include "Support/DriverTest.h"
 
 namespace Varnholt::Tests {
@@ -31,6 +32,15 @@ TEST_P(Interruptions, RefuseAtOnceWhatBeginsBehindThem) {
     }
     files.Interrupt(Paths(2)[1]);
     EXPECT_NO_THROW(setMode()) << "of another device";
+}
+
+TEST_P(Interruptions, AreForgottenOnceTheyAreWithdrawn) {
+    Service::Interruption interruption;
+    interruption.Request();
+    interruption.Withdraw();
+    const Stopwatch watch(clock_);
+    EXPECT_TRUE(interruption.Sleep(20));
+    watch.Expect(20);
 }
 
 TEST_P(Interruptions, AbortThePipesOnWhichTransfersRun) {

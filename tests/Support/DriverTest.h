@@ -2,14 +2,10 @@
 
 #include <gmock/gmock.h>
 
-#include <utility>
-
 #include "DeviceDriver/Generic/EventListener.h"
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "Platform/HostQueries.h"
 #include "Platform/TestThread.h"
-#include "Platform/Threads.h"
-#include "Platform/WaitableObjects.h"
 #include "Support/ExpectThrow.h"
 #include "Support/FailCalls.h"
 #include "Support/ScriptedDriver.h"

@@ -1,18 +1,9 @@
 #pragma once
 
-#include <gtest/gtest.h>
-
-#include <cstdint>
-#include <memory>
-#include <ostream>
-#include <string>
-
 #include "Platform/DeviceFiles.h"
 #include "Platform/Drivers/DriverFileSystem.h"
 #include "Platform/TestThread.h"
-#include "Platform/WaitableObjects.h"
 #include "Protocol/ByteOrder.h"
-#include "Protocol/Instrument.h"
 #include "Protocol/NativeDriver.h"
 #include "Protocol/UsbIoDriver.h"
 #include "Support/HookedUsb.h"

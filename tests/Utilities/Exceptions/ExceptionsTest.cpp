@@ -67,6 +67,9 @@ TEST(Exceptions, TraceGrowsByOneEntryPerOperationLeft) {
     EXPECT_EQ(trace.front(), "::Inner::Fail(): \\src\\b.cpp:292") << "the file from its last source root on";
     EXPECT_THAT(*std::next(trace.begin(), 2), testing::ContainsRegex("^::.*Inner::Outer\\(\\): .*cpp:."));
     EXPECT_STREQ(exception.what(), "bad data");
+    SetVerboseText(true);
+    EXPECT_THAT(exception.what(), testing::ContainsRegex("^bad data\n\t.*\n\t.*\n\t.*\n\t"));
+    SetVerboseText(false);
     EXPECT_EQ(FormatLocation("ctx", "f", "plain.cpp", 7), "ctx::f(): plain.cpp:7");
 
     const auto null = Catch<NullPointerException>([] { *Tools::SmartPointer<Inner>(); });

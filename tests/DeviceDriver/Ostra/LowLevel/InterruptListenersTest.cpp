@@ -178,8 +178,8 @@ TYPED_TEST(InterruptListeners, AreNotHeldUpByAReceiverOrADriverThatDoesNotReturn
         SignalEvent(release.Get());
         SleepMilliseconds(10);
         EXPECT_EQ(receiver.Codes().size(), byDriver ? 0U : 1U) << "what comes behind the end is no news";
-        listener
-            ->ClearListener();  // which whoever held it up no longer does, even where it was ended by force
+        // Nobody holds it up any more, even where the thread was ended by force.
+        listener->ClearListener();
     }
 }
 
