@@ -216,41 +216,52 @@ TEST_F(UsbIpServerTest, FaultsCrossTheConnection) {
     }
 }
 
-TEST_F(UsbIpServerTest, PeerThatStopsWhereItIsDueIsGivenUp) {
+TEST_F(UsbIpServerTest, PeerThatStopsWhereItIsDueIsGivenUpAndOneThatBreaksTheProtocolIsLeft) {
     server_.Add(name_);
-    const auto operation =
-        UsbIp::Encode(UsbIp::OperationHeader{UsbIp::ProtocolVersion, UsbIp::Operation::ImportRequest, {}});
-    const auto busId = UsbIp::EncodeBusId(Platform::Usb::SimulatorBusId);
+    const auto operation = [](UsbIp::Operation kind, std::uint16_t version = UsbIp::ProtocolVersion) {
+        const auto header = UsbIp::Encode(UsbIp::OperationHeader{version, kind, {}});
+        return Tests::Join(header, UsbIp::EncodeBusId(Platform::Usb::SimulatorBusId));
+    };
     UsbIp::SubmitPacket submit;
     submit.length = 8;
     submit.endpoint = BulkOutEndpoint;
-    const Bytes whole = Tests::Join(operation, busId, UsbIp::Encode(submit));
-    for (const auto& [name, size, mayStay] : std::vector<std::tuple<const char*, std::size_t, bool>>{
-             {"sends nothing", 0, false},
-             {"amid an operation", 3, false},
-             {"amid an import", 8, false},
-             {"after an import", 40, true},
-             {"amid a packet", 87, false},
-             {"before a payload", 88, false},
+    const Bytes import = operation(UsbIp::Operation::ImportRequest);
+    const Bytes whole = Tests::Join(import, UsbIp::Encode(submit));
+    submit.in = true;
+    submit.endpoint = BulkInEndpoint;
+    const auto read = UsbIp::Encode(submit);
+    enum After { Left, GivenUp, Served };
+    for (const auto& [name, bytes, size, after] :
+         std::vector<std::tuple<const char*, Bytes, std::size_t, After>>{
+             {"sends nothing", whole, 0, GivenUp},
+             {"amid an operation", whole, 3, GivenUp},
+             {"amid an import", whole, 8, GivenUp},
+             {"after an import", whole, 40, Served},
+             {"amid a packet", whole, 87, GivenUp},
+             {"before a payload", whole, 88, GivenUp},
+             {"another version", operation(UsbIp::Operation::ImportRequest, 0x0110), 8, Left},
+             {"a reply for a request", operation(UsbIp::Operation::ListReply), 8, Left},
+             {"a reply for a packet", Tests::Join(import, UsbIp::Encode(UsbIp::SubmitReply{})), 88, Left},
+             {"two transfers of one number", Tests::Join(import, read, read), 136, Left},
          }) {
         SCOPED_TRACE(name);
         const int file = Platform::Usb::ConnectToSimulator(name_);
         ASSERT_GE(file, 0);
         const auto isOpen = [&] {
-            Bytes bytes(1000);
+            Bytes received(1000);
             ssize_t count = 1;
             for (int i = 0; i < 50 && count != 0; ++i) {
                 usleep(1000);
-                count = recv(file, bytes.data(), bytes.size(), MSG_DONTWAIT);
+                count = recv(file, received.data(), received.size(), MSG_DONTWAIT);
             }
             return count != 0;
         };
-        send(file, whole.data(), size, MSG_NOSIGNAL);
-        EXPECT_TRUE(isOpen());
+        send(file, bytes.data(), size, MSG_NOSIGNAL);
+        EXPECT_EQ(after != Left, isOpen());
         server_.Advance(4'000'000);
-        EXPECT_TRUE(isOpen());
+        EXPECT_EQ(after != Left, isOpen());
         server_.Advance(2'000'000);
-        EXPECT_EQ(mayStay, isOpen());
+        EXPECT_EQ(after == Served, isOpen());
         close(file);
         server_.Advance(0);
     }
