@@ -10,6 +10,7 @@
 #include <optional>
 #include <sstream>
 #include <stdexcept>
+#include <string>
 
 #include "Platform/Linux/FileDescriptor.h"
 #include "Platform/Usb/UsbIpProtocol.h"
@@ -17,14 +18,17 @@
 namespace Varnholt::Simulator {
 namespace {
 
+/// Where the kernel shows its virtual USB host.
+const std::string Folder = "/sys/devices/platform/vhci_hcd.0";
+
 /// The port of the least used controller: devices on one controller are made ready one after the other.
-std::optional<unsigned> FindFreePort(const std::string& folder) {
+std::optional<unsigned> FindFreePort() {
     constexpr unsigned highest = 128;
     constexpr unsigned isFree = 4;
     std::optional<unsigned> best;
     unsigned fewestUsed = ~0U;
     for (unsigned controller = 0; controller < highest; ++controller) {
-        std::ifstream status(folder + "/status" + (controller ? "." + std::to_string(controller) : ""));
+        std::ifstream status(Folder + "/status" + (controller ? "." + std::to_string(controller) : ""));
         if (!status) {
             break;
         }
@@ -51,19 +55,19 @@ std::optional<unsigned> FindFreePort(const std::string& folder) {
 
 }  // namespace
 
-unsigned PlugIntoKernel(int connectedSocket, std::uint32_t deviceId, const std::string& folder) {
+unsigned PlugIntoKernel(int connectedSocket, std::uint32_t deviceId) {
     std::error_code error;
-    if (!std::filesystem::exists(folder, error)) {
+    if (!std::filesystem::exists(Folder, error)) {
         throw std::runtime_error("the kernel's virtual USB host is not there; as root: modprobe vhci-hcd");
     }
-    const auto port = FindFreePort(folder);
+    const auto port = FindFreePort();
     if (!port) {
         throw std::runtime_error("no port of the kernel's virtual USB host is free");
     }
     const std::string order = std::to_string(*port) + " " + std::to_string(connectedSocket) + " " +
                               std::to_string(deviceId) + " " +
                               std::to_string(Platform::Usb::UsbIp::HighSpeed);
-    const Platform::Linux::FileDescriptor file(open((folder + "/attach").c_str(), O_WRONLY | O_CLOEXEC));
+    const Platform::Linux::FileDescriptor file(open((Folder + "/attach").c_str(), O_WRONLY | O_CLOEXEC));
     if (!file || write(file.Get(), order.data(), order.size()) != static_cast<ssize_t>(order.size())) {
         throw std::runtime_error("the kernel does not take the device: " + std::string(std::strerror(errno)));
     }
