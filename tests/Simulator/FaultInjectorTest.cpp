@@ -163,30 +163,5 @@ TEST_F(FaultInjectorTest, LateTransferReachesTheInstrumentLater) {
     EXPECT_EQ(1, last.completions) << "it does not outlive the device";
 }
 
-/// What moved before the cancellation counts, and the rest comes next: each byte once.
-TEST_F(FaultInjectorTest, TransfersThatNeverEndEndWithTheirCancellation) {
-    for (const bool hasData : {false, true}) {
-        SCOPED_TRACE(hasData);
-        const auto device = Open(hasData ? "1+:late-cancel" : "1+:silent");
-        AskForMemory(*device, 10);
-        for (const Bytes& data : {Counting(40, 10), Counting(24, 50)}) {
-            TestTransfer hit = TestTransfer::In(BulkInEndpoint, 40);
-            device->Submit(hit);
-            SleepMilliseconds(clock_.IsVirtual() ? 3'600'000 : 100);
-            EXPECT_EQ(0, hit.completions);
-            device->Cancel(hit);
-            device->Cancel(hit);
-            EXPECT_EQ(1, hit.completions);
-            EXPECT_EQ(TransferStatus::Cancelled, hit.status);
-            EXPECT_EQ(hasData ? data : Bytes(), hit.Data());
-        }
-        TestTransfer request = TestTransfer::Vendor(Request::Reset, {31});
-        device->Submit(request);
-        EXPECT_EQ(0, request.completions);
-        device->Cancel(request);
-        EXPECT_EQ(TransferStatus::Cancelled, request.status);
-    }
-}
-
 }  // namespace
 }  // namespace Varnholt::Simulator
