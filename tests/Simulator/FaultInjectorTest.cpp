@@ -88,8 +88,6 @@ TEST_F(FaultInjectorTest, FaultsOfABulkWrite) {
     for (const auto& [fault, status, moved, memory] :
          std::vector<std::tuple<const char*, TransferStatus, std::uint32_t, Bytes>>{
              {"stall", TransferStatus::Stalled, 0, old},
-             {"io-error", TransferStatus::IoError, 0, old},
-             {"overflow", TransferStatus::Overflow, 0, old},
              {"long", TransferStatus::Overflow, 0, old},
              {"empty", TransferStatus::Completed, 0, old},
              {"short=3", TransferStatus::Completed, 3, {0x11, 0x22, 0x33, 3}},

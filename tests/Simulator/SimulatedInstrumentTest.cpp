@@ -93,24 +93,18 @@ TEST_F(SimulatedInstrumentTest, AnswersComeOnceAndGoWithTheNextRequest) {
 }
 
 TEST_F(SimulatedInstrumentTest, HaltedEndpointStallsUntilCleared) {
-    for (const bool byRequest : {true, false}) {
-        const auto halted = [this] {
-            return Do(TestTransfer::Control({0x82, 0, 0, BulkInEndpoint, 2}, Bytes(2)));
-        };
-        TestTransfer pending = TestTransfer::In(BulkInEndpoint, 64);
-        device_->Submit(pending);
-        Do(TestTransfer::Control({0x02, 3, 0, BulkInEndpoint, 0}, {}));
-        EXPECT_EQ(TransferStatus::Stalled, pending.status);
-        Do(TestTransfer::In(BulkInEndpoint, 64), TransferStatus::Stalled);
-        EXPECT_EQ(halted(), (Bytes{1, 0}));
-        if (byRequest) {
-            Do(TestTransfer::Control({0x02, 1, 0, BulkInEndpoint, 0}, {}));
-        } else {
-            EXPECT_EQ(Errors::Success, device_->ClearHalt(BulkInEndpoint));
-        }
-        EXPECT_EQ(halted(), Bytes(2));
-        EXPECT_EQ(64U, ReadEeprom(0, 64).size());
-    }
+    const auto halted = [this] {
+        return Do(TestTransfer::Control({0x82, 0, 0, BulkInEndpoint, 2}, Bytes(2)));
+    };
+    TestTransfer pending = TestTransfer::In(BulkInEndpoint, 64);
+    device_->Submit(pending);
+    Do(TestTransfer::Control({0x02, 3, 0, BulkInEndpoint, 0}, {}));
+    EXPECT_EQ(TransferStatus::Stalled, pending.status);
+    Do(TestTransfer::In(BulkInEndpoint, 64), TransferStatus::Stalled);
+    EXPECT_EQ(halted(), (Bytes{1, 0}));
+    Do(TestTransfer::Control({0x02, 1, 0, BulkInEndpoint, 0}, {}));
+    EXPECT_EQ(halted(), Bytes(2));
+    EXPECT_EQ(64U, ReadEeprom(0, 64).size());
 }
 
 TEST_F(SimulatedInstrumentTest, UnplugLosesWhatIsVolatile) {

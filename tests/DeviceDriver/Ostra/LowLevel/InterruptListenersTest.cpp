@@ -120,22 +120,6 @@ TYPED_TEST(InterruptListeners, CountWhatArrivesAsTheyStop) {
     EXPECT_THAT(this->receiver_.Codes(), ElementsAre(Button));
 }
 
-/// Wherever its thread is just then: before, in or after the start of a read, in the first one or a later
-/// one.
-TYPED_TEST(InterruptListeners, StopAtOnce) {
-    this->StopWithin(0);  // without a thread
-    for (std::uint32_t round = 0; round < 100; ++round) {
-        SCOPED_TRACE(round);
-        this->listener_ = TypeParam::Make(this->pipe_);
-        this->Script({{.data = {1}}, Silence});
-        this->listener_->Start();
-        this->listener_->Start();  // once is enough
-        SleepMilliseconds(round / 3);
-        this->StopWithin(1);
-        EXPECT_EQ(this->driver_.Running(this->Place), 0U);
-    }
-}
-
 TYPED_TEST(InterruptListeners, StopFromInsideAMessage) {
     const OwnedHandle stopped(MakeAutoResetEvent()), release(MakeAutoResetEvent());
     this->Script({Press});
