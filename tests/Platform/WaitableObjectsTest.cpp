@@ -73,20 +73,6 @@ void ExpectExclusion(Enter enter, Leave leave) {
     EXPECT_EQ(counter, 900);
 }
 
-TEST_P(Waits, TakeOneSignalOfAnEvent) {
-    const OwnedHandle event(MakeAutoResetEvent());
-    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
-    EXPECT_TRUE(SignalEvent(event.Get()));
-    EXPECT_TRUE(SignalEvent(event.Get()));
-    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::Signalled);
-    EXPECT_EQ(Wait(event.Get(), 0), WaitResult::TimedOut);
-    ExpectOneWaitPerSignal(event.Get(), 4, [&] {
-        for (int i = 0; i < 4; ++i) {
-            EXPECT_TRUE(SignalEvent(event.Get()));
-        }
-    });
-}
-
 TEST_P(Waits, RefuseWhatIsNoHandleOrNamesAnotherKindOfObject) {
     const Handle gone = MakeAutoResetEvent();
     const OwnedHandle event(MakeAutoResetEvent());

@@ -123,19 +123,6 @@ TEST_F(FaultInjectorTest, FaultsOfABulkWrite) {
     }
 }
 
-TEST_F(FaultInjectorTest, RequestsReachTheInstrumentShortAndStandardOnesWhole) {
-    const auto device = Open("0:short=4; 1:short=2");
-    TestTransfer descriptor = TestTransfer::Control({0x80, 6, 0x0100, 0, 18}, Bytes(18));
-    TestTransfer parameters = TestTransfer::Vendor(Request::SetMeasureParameters, Bytes(8, 1));
-    TestTransfer misc = TestTransfer::VendorQuestion(Request::GetMisc, 8);
-    for (TestTransfer* const each : {&descriptor, &parameters, &misc}) {
-        device->Submit(*each);
-    }
-    EXPECT_EQ(18U, descriptor.Data().size()) << "neither counted nor short";
-    EXPECT_EQ(TransferStatus::Stalled, parameters.status) << "four bytes are not enough for it";
-    EXPECT_EQ((Bytes{0x01, 0x2D}), misc.Data());
-}
-
 TEST_F(FaultInjectorTest, LateTransferReachesTheInstrumentLater) {
     if (!clock_.IsVirtual()) {
         GTEST_SKIP() << "hangs on milliseconds";

@@ -144,27 +144,5 @@ TEST(SimulatedConnectionTest, WhatWasDueBeforeAnUnpluggingIsNotWaitedForAfterwar
     }
 }
 
-TEST(SimulatedConnectionTest, EachOpeningHasItsOwnClaimAndTransfers) {
-    const auto instrument = std::make_shared<SimulatedInstrument>(Platform::ClockScheduler());
-    const auto other = SimulatedInstrument::Connect(instrument);
-    TestTransfer pending = TestTransfer::In(BulkInEndpoint, 64);
-    TestTransfer ofOther = TestTransfer::In(InterruptInEndpoint, 1);
-    {
-        const auto connection = SimulatedInstrument::Connect(instrument);
-        EXPECT_EQ(Errors::Success, connection->Claim());
-        EXPECT_EQ(Errors::Busy, other->Claim());
-        other->Release();
-        EXPECT_EQ(Errors::Busy, other->Claim()) << "only the owner gives a claim back";
-        connection->Submit(pending);
-        other->Submit(ofOther);
-    }
-    EXPECT_EQ(TransferStatus::Cancelled, pending.status) << "closing ends its own transfers";
-    EXPECT_EQ(1, pending.completions);
-    EXPECT_EQ(0, ofOther.completions);
-    EXPECT_EQ(Errors::Success, other->Claim());
-    instrument->Unplug();
-    EXPECT_EQ(TransferStatus::DeviceGone, ofOther.status);
-}
-
 }  // namespace
 }  // namespace Varnholt::Simulator

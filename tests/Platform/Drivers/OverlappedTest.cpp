@@ -1,5 +1,4 @@
 #include <atomic>
-#include <new>
 #include <thread>
 
 #include "Platform/Drivers/DriverFixture.h"
@@ -206,21 +205,6 @@ TEST_F(OverlappedFiles, CloseAfterACancellationUnderWay) {
     closer.join();
     EXPECT_EQ(device_->cancellations, 1);
     EXPECT_TRUE(request_.TakeSignal());
-}
-
-// A failure that is known at once is still the result of a request that was started.
-TEST_F(OverlappedFiles, MakeAFailureInsideTheStartAResult) {
-    device_->onSubmit = [](Transfer& transfer) {
-        Complete(transfer, TransferStatus::IoError, 0xFFFF);
-        return Errors::Success;
-    };
-    StartPending(pipe_, buffer_, request_);
-    EXPECT_TRUE(request_.TakeSignal());
-    EXPECT_EQ(Result(pipe_, request_), (Outcome{Errors::GeneralFailure, 8})) << "no more than was asked for";
-
-    device_->onSubmit = [](Transfer&) -> Platform::ErrorCode { throw std::bad_alloc(); };
-    EXPECT_EQ(Read(pipe_, buffer_).code, Errors::NotEnoughMemory);
-    EXPECT_TRUE(files_->CloseFile(pipe_)) << "nothing is left running";
 }
 
 // As they do for a host that forgets to close them.

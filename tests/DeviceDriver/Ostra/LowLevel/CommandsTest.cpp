@@ -175,24 +175,6 @@ TEST_P(Commands, MoveMemoryInPiecesThatTheWireCanCarry) {
     EXPECT_THROW(PellandoFunctionality{Pointer()}, NullPointerException);
 }
 
-TEST_P(Commands, CanBeMadeToRefuseDataThatAreNotWhole) {
-    PellandoFunctionality& instrument = Open();
-    const std::function<void()> set = [&] { instrument.SetMeasureParameters(1, 2, 3, 4); };
-    const std::function<void()> get = [&] { instrument.GetMeasureParameters(a, b, c, m[0], m[1]); };
-    transport_->RequireWholeData();
-    for (const auto* const command : {&set, &get}) {
-        for (const std::uint32_t moved : {0U, 1U, 7U, 8U, 9U}) {
-            SCOPED_TRACE(moved);
-            driver_.Script(0, {.count = moved});
-            // The native driver need not say how much it sent.
-            const bool isUnknown = IsNative() && command == &set && moved == 0;
-            moved == 8 || isUnknown
-                ? (*command)()
-                : ExpectThrow<IOException>(std::to_string(moved) + " of 8 bytes came", *command);
-        }
-    }
-}
-
 /// The native driver's record keeps its bytes from one command to the next, and so they are sent.
 TEST_P(Commands, SendWhatEarlierCommandsLeftOverTheNativeDriverOnly) {
     const bool isNative = IsNative();
