@@ -152,9 +152,6 @@ std::unique_ptr<DriverFile> DriverFileSystem::OpenOnDevice(const DevicePath& pat
 }
 
 bool DriverFileSystem::CloseFile(Handle file) {
-    if (CallMustFail("CloseFile")) {
-        return false;
-    }
     const std::shared_ptr<OpenFile> open = files_.Find(file);
     std::unique_ptr<DriverFile> driver = open ? open->Close() : nullptr;
     if (!driver) {
