@@ -37,16 +37,15 @@ TEST_P(Schedulers, ForgetEvents) {
     EXPECT_EQ(held.use_count(), 1) << "what is forgotten holds nothing any more";
     EXPECT_EQ(Wait(done.Get(), LongTimeout), WaitResult::Signalled);
     scheduler.Forget(&own);
-    scheduler.Forget(&forgotten);
     EXPECT_EQ(called, 0);
 }
 
 TEST_P(Schedulers, ForgetReturnsAfterACallThatIsRunning) {
     EventScheduler& scheduler = ClockScheduler();
-    const OwnedHandle running(MakeAutoResetEvent());
+    const OwnedHandle running(MakeAutoResetEvent()), forgotten(MakeAutoResetEvent());
     std::atomic<bool> over = false;
     const auto event = [&] {
-        SignalEvent(running.Get());
+        EXPECT_EQ(SignalAndWait(running.Get(), forgotten.Get(), LongTimeout), WaitResult::Signalled);
         SleepMilliseconds(30);
         // Whoever forgets the owner meanwhile is not to meet this one, either.
         scheduler.CallAt(
@@ -56,15 +55,26 @@ TEST_P(Schedulers, ForgetReturnsAfterACallThatIsRunning) {
     scheduler.CallAt(scheduler.Now(), event, &over);
     TestThread other([&] {
         EXPECT_EQ(Wait(running.Get(), LongTimeout), WaitResult::Signalled);
+        scheduler.Forget(&forgotten);  // does not wait for another owner's call
+        SignalEvent(forgotten.Get());
         scheduler.Forget(&over);
         EXPECT_TRUE(over);
     });
 }
 
-TEST(RealSchedulers, EndBeforeTheirEvents) {
-    RealScheduler scheduler([](std::function<void()> run) { return std::thread(std::move(run)); });
-    scheduler.CallAt(
-        scheduler.Now() + 60'000'000, [] { ADD_FAILURE(); }, nullptr);
+TEST(RealSchedulers, HaveAThreadOnlyWhileEventsWaitAndEndBeforeThem) {
+    static int threads;
+    threads = 0;
+    RealScheduler scheduler([](std::function<void()> run) {
+        ++threads;
+        return std::thread(std::move(run));
+    });
+    for (int i = 0; i < 2; ++i) {
+        scheduler.Forget(&threads);
+        scheduler.CallAt(
+            scheduler.Now() + 60'000'000, [] { ADD_FAILURE(); }, &threads);
+    }
+    EXPECT_EQ(threads, 2) << "the first has ended with its event";
 }
 
 /// Events from several threads that come and go quickly, so that the scheduler's own thread does as well.

@@ -212,7 +212,6 @@ TEST_P(Waits, ForASemaphoreAreCountedUpToItsMaximum) {
             EXPECT_EQ(ErrorOf(ReleaseSemaphore(semaphore.Get(), tooMany)), Errors::TooManyPosts);
         }
         EXPECT_FALSE(ReleaseSemaphore(semaphore.Get(), -1));
-        ReleaseSemaphore(semaphore.Get(), 0);  // systems differ in whether they refuse it
         EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
         EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
         EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::TimedOut);

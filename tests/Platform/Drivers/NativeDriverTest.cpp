@@ -54,7 +54,6 @@ TEST_F(NativeDriver, RefusesWhatAFileDoesNotTake) {
     const std::vector<std::tuple<const char*, std::uint32_t, Bytes, std::size_t, Platform::ErrorCode>>
         controls{
             {"unknown code", 0x220005, good, 0, Errors::InvalidFunction},
-            {"no block", Vendor, {}, 0, Errors::InvalidParameter},
             {"short block", Vendor, Bytes(9), 0, Errors::InvalidParameter},
             {"long block", Vendor, Bytes(11), 0, Errors::InvalidParameter},
             {"direction 2", Vendor, NativeBlock(0xC0, 2), 0, Errors::InvalidParameter},

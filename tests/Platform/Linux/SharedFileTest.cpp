@@ -8,6 +8,7 @@
 #include <set>
 
 #include "ForkedProcess.h"
+#include "Platform/EventScheduler.h"
 #include "Platform/Linux/SharedFile.h"
 #include "TestThread.h"
 #include "UniqueName.h"
@@ -105,11 +106,9 @@ TEST_F(SharedFiles, OfTheDeadAreTakenOver) {
     ForkedProcess dying([this] { return static_cast<int>(Wait(MakeMutex(name_), 0)); });
     EXPECT_EQ(dying.WaitForExit(), static_cast<int>(WaitResult::Signalled));
     ASSERT_TRUE(std::filesystem::exists(path_));
-    OwnedHandle mutex(MakeMutex(name_));
+    const OwnedHandle mutex(MakeMutex(name_));
     EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Abandoned);
     EXPECT_TRUE(ReleaseMutex(mutex.Get()));
-    mutex.Reset();
-    EXPECT_FALSE(std::filesystem::exists(path_));
 }
 
 /// Somebody who keeps the file locked for himself makes it unusable, but holds nobody up for good.
@@ -117,7 +116,9 @@ TEST_F(SharedFiles, ThatAreLockedAreBusy) {
     std::ofstream{path_};
     const int user = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
     ASSERT_EQ(flock(user, LOCK_EX), 0);
+    const std::uint64_t start = ClockScheduler().Now();
     EXPECT_EQ(ErrorOf(MakeMutex(name_) != NoHandle), Errors::Busy);
+    EXPECT_GT(ClockScheduler().Now() - start, 100'000U) << "for whom the file is about to go";
     close(user);
 }
 
@@ -145,6 +146,8 @@ class UserDirectories : public testing::Test {
 };
 
 TEST_F(UserDirectories, AreFoundBesideWhatOthersPutInTheirPlace) {
+    EXPECT_EQ(UserDirectory::Open(above_)->Path(), first_);
+    std::filesystem::remove(first_);
     std::string expected = first_;
     int taken = 0;
     for (const Squatter squatter : {File, Pipe, Link, DeadLink, &GivenAway<Directory>}) {

@@ -26,8 +26,6 @@ TEST(RegistryInterfaces, ClassIsReadFromTheValueName) {
              {"{00873FDF-61A8-11D1-AA5E-00C04FB1728B}\\0001", true},
              {"{989D6515-E122-4442-A357-751457F102A5}", false},
              {"{00873FDE-61A8-11D1-AA5E-00C04FB1728B}", false},
-             {"{00873FDF-61A8-11D1-AA5F-00C04FB1728B}", false},
-             {"{00873FDF-61A8-11D1-AA5E-00C04FB1728C}", false},
              {"{00873FDF-61A8-11D1-AA5-00C04FB1728B}", false},
              {"{00873FDF-61A8-11D1-AA5E-00C04FB1728}", false},
              {"{00873FDF-61A8-11D1-AA5E-00C04FB172XY}", false},
