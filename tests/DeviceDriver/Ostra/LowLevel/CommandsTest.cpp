@@ -175,6 +175,14 @@ TEST_P(Commands, MoveMemoryInPiecesThatTheWireCanCarry) {
     EXPECT_THROW(PellandoFunctionality{Pointer()}, NullPointerException);
 }
 
+TEST_P(Commands, CanBeMadeToRefuseDataThatAreNotWhole) {
+    PellandoFunctionality& instrument = Open();
+    transport_->RequireWholeData();
+    driver_.Script(Out(), {.count = 2});
+    ExpectThrow<IOException>(IsNative() ? "write data failed (Not enough data)" : "2 of 3 bytes came",
+                             [&] { instrument.WriteEEPROM(0, Bytes(3)); });
+}
+
 /// The native driver's record keeps its bytes from one command to the next, and so they are sent.
 TEST_P(Commands, SendWhatEarlierCommandsLeftOverTheNativeDriverOnly) {
     const bool isNative = IsNative();

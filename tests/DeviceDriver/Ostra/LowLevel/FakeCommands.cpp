@@ -68,7 +68,7 @@ class FakeCommands final : public Service::ImageTransport {
     void ReadEEPROM(const Bytes4& address, const Bytes2& length, std::uint8_t* data,
                     std::uint32_t count) override {
         Receive("read ", address, length);
-        ImageTransport::ReadEEPROM(address, length, data, count);
+        ImageTransport::ReadEEPROM(address, length, data, count - instrument_.missing);
     }
     void GetMISC(std::uint8_t& m1, Bytes2& m2, std::uint8_t& m3, Bytes2& m4, Bytes2& m5) override {
         Receive("GetMISC");

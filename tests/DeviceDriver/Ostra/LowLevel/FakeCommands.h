@@ -25,6 +25,7 @@ struct FakeInstrument {
     /// The six answers to `GetMeasureMode` in the current mode.
     std::function<std::array<std::uint8_t, 6>(std::uint8_t mode)> describeMode{};
 
+    std::uint32_t missing = 0;  ///< bytes that a read of the EEPROM ends too early
     /// The command with this index fails with `IOException`.
     std::size_t failingCommand = ~std::size_t{0};
 

@@ -120,6 +120,16 @@ TYPED_TEST(InterruptListeners, CountWhatArrivesAsTheyStop) {
     EXPECT_THAT(this->receiver_.Codes(), ElementsAre(Button));
 }
 
+TYPED_TEST(InterruptListeners, NeedTheirEvents) {
+    for (const int event : {1, 2}) {
+        FailCalls("MakeAutoResetEvent", Errors::NoSystemResources, event);
+        ExpectThrow<IOException>(
+            std::string("could not create interrupt listener ") + (TypeParam::IsUsbIo ? "thread" : "events"),
+            [this] { TypeParam::Make(this->pipe_)->Start(); });
+        InstallCallFilter({});
+    }
+}
+
 TYPED_TEST(InterruptListeners, StopFromInsideAMessage) {
     const OwnedHandle stopped(MakeAutoResetEvent()), release(MakeAutoResetEvent());
     this->Script({Press});

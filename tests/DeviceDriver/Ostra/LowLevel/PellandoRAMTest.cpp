@@ -137,7 +137,6 @@ TEST_F(RamTest, StoresRoundedCountsTheThirdParameterAndFlags) {
         times("more than 32 bits", 1e9F, 1e9F, "65535 65535 100 0"),
         times("less than 32 bits", -1e9F, -Infinity, "0 0 100 0"),
         times("no number", NotANumber, NotANumber, "0 0 100 0"),
-        third(256, -1, 0, "1000 10 256 0"),
         third(300, -1, 0, "1000 10 256 0"),
         third(-1, -1, 0, "1000 10 65535 0"),
         third(100, 0, 1, "1000 10 100 1"),

@@ -202,9 +202,6 @@ TEST_F(NativeDevice, RemovesAListenerWhoseMessageWaitsForTheDeviceLock) {
     }
     SleepMilliseconds(10);
     EXPECT_THAT(listener_.Codes(), IsEmpty());
-    driver_.Complete(InterruptPipe, ButtonData);
-    SleepMilliseconds(10);
-    EXPECT_THAT(listener_.Codes(), IsEmpty());
 }
 
 TEST_F(NativeDevice, MayBeUsedAndClosedFromInsideAMessage) {
@@ -265,7 +262,6 @@ TEST(NativeDeviceName, KeepsLettersAndDigits) {
     EXPECT_EQ(PellandoUSBDevice::StripStrangeChars(
                   "\\\\?\\usb#Vid_04b4&pid_1004#5&2a#{00873FDF-61A8}.\xC4z9:0/A@Z[a`"),
               "usbVid04b4pid100452a00873FDF61A8z90AZa");
-    EXPECT_EQ(PellandoUSBDevice::StripStrangeChars("\\?#&{}-_./@[`~ "), "");
 }
 
 }  // namespace

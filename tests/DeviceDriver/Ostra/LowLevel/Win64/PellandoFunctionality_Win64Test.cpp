@@ -82,8 +82,6 @@ TEST_F(UsbIoOpening, EachOfItsStepsCanFail) {
     }
     FailCalls("MakeList", Platform::Errors::NoSystemResources, 2);
     ExpectFailure("Unable to create device list.", 0);
-    FailCalls("StartThread");
-    ExpectFailure("could not create interrupt listener thread", 0);
 }
 
 constexpr std::uint32_t Whole = 65536;
@@ -172,7 +170,7 @@ TEST_F(UsbIoScan, OpenEndedScansGrowAndBeepOnceEach) {
         EXPECT_EQ(TakeAll(100000), CountingImage(0, total)) << total;
         EXPECT_EQ(driver_.Running(BulkInEndpoint), 0U);
         ASSERT_EQ(Platform::Wait(beeped_.Get(), 10000), Platform::WaitResult::Signalled);
-        stopwatch.ExpectBetween(370, 372);
+        stopwatch.Expect(370);
         EXPECT_EQ(beeps_, ++beeps);
     }
 }
