@@ -46,7 +46,7 @@ TEST_F(LogTest, DumpIsRecommendedAfterTheLastWatchedItem) {
     }
 }
 
-TEST_F(LogTest, IncrementAddsToWhatIsThere) {
+TEST_F(LogTest, IncrementAddsToWhatIsThereAndADumpUpdatesTheChecksum) {
     PellandoLog log = Read();
     log.SetItem(10003, Property(std::numeric_limits<std::int32_t>::max()));
     log.Increment(10003, std::int32_t{2});
@@ -54,6 +54,8 @@ TEST_F(LogTest, IncrementAddsToWhatIsThere) {
     log.SetItem(10001, Property(1.0F));
     log.Increment(10001, 0.5F);
     EXPECT_EQ(log.GetItem(10001).AsFloat(), 1.5F);
+    log.Dump(dumped_.begin(), dumped_.end());
+    EXPECT_EQ(Bytes(dumped_.begin(), dumped_.begin() + 4), (Bytes{0xBF, 0xC0, 0x00, 0x01})) << "checksum";
 }
 
 }  // namespace
