@@ -37,6 +37,7 @@ class UsbIoDevice final {
     ErrorCode Unconfigure();
 
     ErrorCode Bind(std::uint8_t endpoint, Binding& binding);
+    /// Of 0 nothing: no pipe is bound to it.
     void Unbind(std::uint8_t endpoint);
 
     Parameters ReadParameters();

@@ -65,9 +65,7 @@ UsbIoDriverFile::UsbIoDriverFile(std::shared_ptr<UsbIoDevice> usbIoDevice)
     : DriverFile(usbIoDevice->Shared()), usbIo_(std::move(usbIoDevice)) {}
 
 UsbIoDriverFile::~UsbIoDriverFile() {
-    if (binding_ != 0) {
-        usbIo_->Unbind(binding_);
-    }
+    usbIo_->Unbind(binding_);
 }
 
 Decision UsbIoDriverFile::Move(bool in, Usb::Transfer& transfer) {
