@@ -38,10 +38,10 @@ TEST_P(Threads, EndByForceOrSayThatTheyCannot) {
     });
     SleepMilliseconds(20);
     EXPECT_FALSE(thread.HasEnded() || left) << "who asks without waiting does not wait";
-    const bool isEnded = EndThreadByForce(thread.Get(), 0xFFFFFFFF);
+    const ErrorCode code = ErrorOf(EndThreadByForce(thread.Get(), 0xFFFFFFFF));
     SignalEvent(leave.Get());
     thread.Join();
-    EXPECT_NE(left, isEnded);
+    EXPECT_EQ(code, left ? Errors::NotSupported : Errors::Success);
     EXPECT_EQ(ErrorOf(EndThreadByForce(NoHandle, 0)), Errors::InvalidHandle);
 }
 
