@@ -16,7 +16,7 @@ Answer TryInstrument(Context& context, const std::string& identifier) {
             return Answer{m2, std::nullopt};
         });
     } catch (...) {
-        return {0, context.Explain(std::current_exception())};
+        return {.failure = context.Explain(std::current_exception())};
     }
 }
 

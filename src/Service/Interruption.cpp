@@ -22,7 +22,7 @@ void Interruption::Withdraw() {
 }
 
 bool Interruption::Sleep(std::uint32_t milliseconds) const {
-    if (!requested_ && milliseconds > 0) {
+    if (!requested_) {
         Platform::Wait(event_.Get(), milliseconds);
     }
     return !requested_;

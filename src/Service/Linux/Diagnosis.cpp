@@ -188,7 +188,7 @@ Answer Try(Context& context, const std::string& shortName) {
     const std::vector<std::string> connected = ListInstruments(context);
     const auto listed = std::ranges::find(connected, shortName, &ShortNameOf);
     if (listed == connected.end()) {
-        return {0, Failure{FailureKind::NotFound, "the library does not list it", Replug}};
+        return {.failure = Failure{FailureKind::NotFound, "the library does not list it", Replug}};
     }
     return TryInstrument(context, *listed);
 }

@@ -43,8 +43,7 @@ struct Mode {
 };
 
 /// What an instrument without modes counts with.
-constexpr Mode OnlyMode{
-    .count = 1, .number = 1, .m3 = 0, .coarseFactor = 130, .tickMicroseconds = 68, .flags = 0};
+constexpr Mode OnlyMode{.coarseFactor = 130, .tickMicroseconds = 68};
 
 Mode CurrentMode(PellandoFunctionality& commands) {
     Mode mode;
@@ -155,7 +154,6 @@ Properties RamAccess::Load() {
     PellandoRAM ram(commands_);
     Properties set("PhysicalConditions");
     ram.Load(set);
-    loaded_.reset();
     if (HasModes(set)) {
         std::uint16_t p1 = 0, p2 = 0, p3 = 0;
         std::uint8_t p4 = 0, p5 = 0;

@@ -8,10 +8,9 @@
 namespace Varnholt::Utilities::Tools {
 
 std::string ReadableName(const std::type_info& type) {
-    int status = 0;
     const std::unique_ptr<char, void (*)(void*)> name(
-        abi::__cxa_demangle(type.name(), nullptr, nullptr, &status), std::free);
-    return status == 0 && name ? name.get() : type.name();
+        abi::__cxa_demangle(type.name(), nullptr, nullptr, nullptr), std::free);
+    return name ? name.get() : type.name();
 }
 
 }  // namespace Varnholt::Utilities::Tools
