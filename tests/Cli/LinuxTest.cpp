@@ -92,9 +92,11 @@ TEST_F(RegisterTest, DryRunsAndMistakesChangeNothing) {
     const std::string before = Rules();
     EXPECT_EQ(Register("1209:0001 --remove --dry-run"), ExitCode::Success);
     EXPECT_NE(tool_.Out().find("would remove"), std::string::npos) << tool_.Out();
-    for (const char* id : {"1209", "1209:1", "1209-0001", "1209:000g", "1209:00011", "\"1209:0001", "''"}) {
+    for (const char* id : {"''", "1209", "1209:1", "1209-0001", "1209:000g", "1209:00011", "\"1209:0001"}) {
         EXPECT_EQ(Register(id), ExitCode::Usage) << id;
     }
+    EXPECT_NE(tool_.Err().find("hexadecimal digits each, such as 1209:0001; `ostra list --candidates`"),
+              std::string::npos);
     EXPECT_EQ(Rules(), before);
 }
 

@@ -114,6 +114,8 @@ TEST_P(ScanTest, ProgressOnATerminalAndASummary) {
     EXPECT_EQ(tool_.Json()["records"], 2000);
     EXPECT_EQ(tool_.Json()["file"], folder_.Path("csv"));
     EXPECT_EQ(tool_.Json()["ended"], "complete");
+    Succeed("eeprom check");
+    EXPECT_THAT(tool_.Err(), HasSubstr("reading  [========================]  8.2 kB of 8.2 kB"));
 }
 
 /// Whatever ends a scan too early: what came is kept, as whole records, and the exit code and the text say
@@ -127,6 +129,7 @@ TEST_P(ScanTest, WhatCameIsKept) {
          std::vector<std::tuple<const char*, std::function<void(Service::Interruption&)>, ExitCode,
                                 std::string, const char*, bool>>{
              {"", interrupt, ExitCode::Interrupted, "interrupted", "scan interrupted; ", true},
+             {"bulk-in 0:silent", interrupt, ExitCode::Interrupted, "interrupted", "; nothing was", false},
              {"", unplug, ExitCode::NoInstrument, "unplugged", "", true},
              {"bulk-in 4+:silent", nothing, ExitCode::Timeout, "timeout", "", true},
              {"bulk-in 0+:silent", nothing, ExitCode::Timeout, "timeout", "; nothing was recorded", false},
@@ -206,7 +209,6 @@ TEST_P(ScanTest, EveryByteBeforeTheEndCounts) {
 /// Wherever it comes: while the instrument is opened, waited for, scanned, closed.
 TEST_P(ScanTest, CtrlCAtAnyTime) {
     host_.Add("sim", Streaming(102'400, 40'000));
-    int interrupted = 0;
     for (std::uint64_t after = 0; after < 4'000; after += 100) {
         SCOPED_TRACE(after);
         Service::Interruption interruption;
@@ -216,8 +218,8 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
         const ExitCode code = tool_.Run("scan --raw --output @raw");
         ForgetEvents();
         watch.ExpectAtMost(code == ExitCode::Interrupted ? after + 50 : 8'000);
-        EXPECT_TRUE(code == ExitCode::Interrupted || code == ExitCode::Success) << tool_.Err();
-        interrupted += code == ExitCode::Interrupted ? 1 : 0;
+        // The scan ends by itself after 3.6 s.
+        EXPECT_TRUE(code == ExitCode::Interrupted || (code == ExitCode::Success && after > 3'000));
         if (const auto files = folder_.Files(); !files.empty()) {
             EXPECT_EQ(files, std::vector<std::string>{"raw"});
             const auto bytes = ReadFile(folder_.Path("raw"));
@@ -227,7 +229,6 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
             std::filesystem::remove(folder_.Path("raw"));
         }
     }
-    EXPECT_GT(interrupted, 20);
     tool_.interruption = nullptr;
     Succeed("scan --output @csv");
 }

@@ -2,6 +2,7 @@
 #include "ExpectFindings.h"
 #include "Platform/Usb/SimulatorAddress.h"
 #include "Service/Linux/Diagnosis.h"
+#include "Service/SystemAdvice.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -59,6 +60,8 @@ TEST(DoctorTest, NamesTheReasonAndTheFix) {
     auto other = Plugged();
     other.hasEndpoints = false;
     const Failure noLock{FailureKind::NoLock, "no lock there", "make room"};
+    MachineFacts ofNobody = Simulated("", true, false);
+    ofNobody.simulators[0].processId = 0;
     MachineFacts inKernel = Simulated(Platform::Usb::KernelAsUser);
     inKernel.devices = {Plugged()};
     MachineFacts withoutUsb = Simulated("");
@@ -100,6 +103,8 @@ TEST(DoctorTest, NamesTheReasonAndTheFix) {
               "end that program", FailureKind::InUse},
              {"simulated, stopped", Simulated("", true, false), "p", "simulated-1 does not answer",
               "kill -CONT 9", FailureKind::Timeout},
+             {"simulated, stopped by nobody known", ofNobody, "p", "simulated-1 does not answer",
+              "whoever runs it should let it go on", FailureKind::Timeout},
              {"simulated, another user's", Simulated("", false), "np", "another user (user 1000, process 9)",
               "ostra-simulator", NotFound},
              {"simulated, plugged into the kernel", inKernel, "gn", "is plugged into the kernel", "", {}, 1},
@@ -125,6 +130,17 @@ TEST(DoctorTest, NamesTheReasonAndTheFix) {
         };
         ExpectFindings(Service::Judge(row.facts, open), row.levels, row.text, row.fix, row.failure);
         EXPECT_EQ(opened, row.opened) << "opening resets an instrument";
+    }
+}
+
+TEST(DoctorTest, TellsWhyThereIsNoLock) {
+    using namespace Platform::Errors;
+    for (const auto& [code, reason, advice] :
+         {std::tuple(AccessDenied, std::string("it may not be written"), "sudo chmod 1777 /dev/shm"),
+          {InvalidHandle, Platform::ErrorText(InvalidHandle), "sudo mkdir -p /dev/shm"}}) {
+        const Failure failure = DescribeMissingLock(code);
+        EXPECT_EQ(failure.Message(), "the lock that instruments need cannot be had in /dev/shm: " + reason);
+        EXPECT_THAT(failure.Advice(), testing::StartsWith(advice));
     }
 }
 

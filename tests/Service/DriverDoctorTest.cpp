@@ -34,11 +34,12 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
              Case{"nothing", false, none, "np", "no device with either driver", "look at its cable",
                   NotFound},
              {"own driver", false, native, "ng", "native/a answers (firmware 258)"},
-             {"USBIO", true, {"usbio/a", "usbio/b"}, "ngg", "usbio/b answers"},
+             {"USBIO", true, {"usbio/a", "usbio/b"}, "ngg", "usbio/b answers", "", {}, 0x02FF},
              {"own driver only", true, native, "np",
-              "has the instrument's own driver, which is not used here: ",
+              "own driver, which is not used here: on 64-bit Windows the USBIO driver is used\n",
               "install a USBIO driver of interface", NotFound},
-             {"USBIO only", false, usbIo, "np", "has the USBIO driver, which is not used here: ",
+             {"USBIO only", false, usbIo, "np",
+              "USBIO driver, which is not used here: on 32-bit Windows the instrument's own driver is used\n",
               "install the instrument's own driver", NotFound},
              {"too old", true, usbIo, "np", "of interface version 2.2F", "install a USBIO driver", NotFound,
               0x022F},
@@ -60,7 +61,7 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
         Bytes information(12);
         Protocol::StoreLittle16(&information[0], row.version);
         for (int opening = 0; opening < 10; ++opening) {
-            driver.Script(Protocol::UsbIoDriver::Control::GetDriverInfo, {.data = information});
+            driver.Script(Protocol::UsbIoDriver::Control::GetDriverInfo, {.data = information, .after = 1});
         }
         driver.Script(0, {.after = row.isSilent ? Never : 0U});
         driver.Script(0, {.data = Counting(8, 1)});
@@ -69,6 +70,7 @@ TEST(DriverDoctorTest, NamesTheReasonAndTheFix) {
         Service::Interruption never;
         Service::Context context(nobody, never, files);
         ExpectFindings(Service::DiagnoseDrivers(context), row.levels, row.text, row.fix, row.failure);
+        EXPECT_EQ(driver.OpenFiles(), 0U);
         Platform::InstallCallFilter({});
         Platform::Override64BitHost(std::nullopt);
     }

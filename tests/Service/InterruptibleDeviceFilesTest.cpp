@@ -66,10 +66,10 @@ TEST_P(Interruptions, AbortThePipesOnWhichTransfersRun) {
     files.Start(busy, Operation::Write(data.data(), 4), record);
     files.CloseFile(idle);
     driver_.TakeTranscript();
-    driver_.Script(0, {.after = Never});
+    driver_.Script(0, {.after = Never, .cancelledAfter = 5});
     const Stopwatch watch(clock_);
     files.Interrupt(Paths(2)[1]);
-    watch.ExpectBetween(2000, 2010);  // for the driver's answer
+    watch.Expect(2005);  // for the driver's answer, and the end of its asking
     EXPECT_THAT(
         driver_.TakeTranscript(),
         ElementsAre(IsNative() ? "control 220009 00 00 00 00 00 00 03 00 00 00 /" : "control 80942084 /",
@@ -79,6 +79,9 @@ TEST_P(Interruptions, AbortThePipesOnWhichTransfersRun) {
     EXPECT_FALSE(files.GetResult(busy, record, moved, false));
     EXPECT_EQ(Platform::LastError(), Platform::Errors::OperationAborted);
     EXPECT_EQ(told, "bulk out 0 of 4: cancelled");
+    driver_.TakeTranscript();
+    files.Interrupt(Paths(2)[1]);
+    EXPECT_THAT(driver_.TakeTranscript(), IsEmpty()) << "nothing runs any more";
 }
 
 }  // namespace

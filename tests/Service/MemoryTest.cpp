@@ -260,6 +260,9 @@ TEST(ImageCheckTest, FindsWhatIsWrong) {
              {{Entry(26, 1000, 4200), Entry(27, 1001, 4200)},
               "warning table: values of another size than usual: 1000, 1001\nerror table: the table and 1001 "
               "overlap"},
+             {{Entry(53, 3013, 4200), Entry(54, 2, 4200)},
+              "warning table: values of another size than usual: 3013\nerror table: the driver refuses the "
+              "image: corrupt EAT detected!!"},  // what is empty lies over nothing
              {{Entry(27, 1999, 4616)},
               "warning table: unknown identifiers: 1999\nwarning table: the calibration lacks 1001"},
              {{Entry(0, 1999, 0)},

@@ -99,10 +99,12 @@ TEST_F(RamAccessTest, WhatWasLoadedIsKeptAndWhatIsTypedTakenInEveryMode) {
 /// A count may stand for a time that another mode takes, although the time that it was made of did not.
 TEST_F(RamAccessTest, WhatWasStoredIsKeptWithAnyNumberOfModes) {
     int stored = 0, roundedIntoAnotherMode = 0;
-    modes_ = {{50, 5}, {2, 10}};
+    modes_.assign(255, {255, 255});
+    modes_[253] = {50, 5};
+    modes_[254] = {2, 10};
     Put(1, 1000);
     ASSERT_TRUE(Store(0.000247F));
-    EXPECT_EQ(std::pair(int{instrument_.mode}, int{instrument_.p1}), std::pair(2, 25));
+    EXPECT_EQ(std::pair(int{instrument_.mode}, int{instrument_.p1}), std::pair(255, 25));
     EXPECT_TRUE(IsKept());
 
     for (int round = 0; round < 20000; ++round) {

@@ -54,6 +54,7 @@ TEST(Exceptions, QualifiedNamesComeOutOfSignatures) {
         {"N::A::operator bool() const", "N::A::operator bool"},
         {"N::P<T>::P() [with T = int]", "N::P<int>::P"},
         {"void N::{anonymous}::f(int)", "N::{anonymous}::f"},
+        {"const char *N::A::f()", "N::A::f"},
     };
     for (const auto& [signature, name] : cases) {
         EXPECT_EQ(QualifiedName(signature), name);
