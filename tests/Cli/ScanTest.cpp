@@ -129,7 +129,6 @@ TEST_P(ScanTest, WhatCameIsKept) {
          std::vector<std::tuple<const char*, std::function<void(Service::Interruption&)>, ExitCode,
                                 std::string, const char*, bool>>{
              {"", interrupt, ExitCode::Interrupted, "interrupted", "scan interrupted; ", true},
-             {"bulk-in 0:silent", interrupt, ExitCode::Interrupted, "interrupted", "; nothing was", false},
              {"", unplug, ExitCode::NoInstrument, "unplugged", "", true},
              {"bulk-in 4+:silent", nothing, ExitCode::Timeout, "timeout", "", true},
              {"bulk-in 0+:silent", nothing, ExitCode::Timeout, "timeout", "; nothing was recorded", false},

@@ -141,11 +141,13 @@ TEST_F(FaultInjectorTest, LateTransferReachesTheInstrumentLater) {
     SleepMilliseconds(2);
     EXPECT_EQ(Counting(ReadLength, 10), hit.Data()) << "nothing was lost to the cancelled one";
     EXPECT_EQ(1, cancelled.completions);
-    TestTransfer last = TestTransfer::In(BulkInEndpoint, ReadLength);
-    device->Submit(last);
+    TestTransfer last[]{TestTransfer::In(BulkInEndpoint, ReadLength),
+                        TestTransfer::In(BulkInEndpoint, ReadLength)};
+    device->Submit(last[0]);
+    device->Submit(last[1]);
     device.reset();
     SleepMilliseconds(100);
-    EXPECT_EQ(1, last.completions) << "it does not outlive the device";
+    EXPECT_EQ(2, last[0].completions + last[1].completions) << "none outlives the device";
 }
 
 }  // namespace
