@@ -55,14 +55,6 @@ TEST_F(SharedFiles, AreTheUsersOwnAndGoWithTheLastHandle) {
     ASSERT_EQ(stat(path_.c_str(), &state), 0);
     EXPECT_EQ(state.st_mode & 0777, 0600u);
     EXPECT_EQ(state.st_uid, geteuid());
-    const std::string directory = UserDirectory::Open()->Path();
-    std::error_code ignored;
-    for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
-        if (std::filesystem::read_symlink(entry, ignored).string().starts_with(directory)) {
-            EXPECT_EQ(fcntl(std::stoi(entry.path().filename()), F_GETFD), FD_CLOEXEC)
-                << "no child's business";
-        }
-    }
     first.Reset();
     EXPECT_TRUE(std::filesystem::exists(path_));
     second.Reset();
@@ -109,6 +101,15 @@ TEST_F(SharedFiles, OfTheDeadAreTakenOver) {
     const OwnedHandle mutex(MakeMutex(name_));
     EXPECT_EQ(Wait(mutex.Get(), 0), WaitResult::Abandoned);
     EXPECT_TRUE(ReleaseMutex(mutex.Get()));
+    const OwnedHandle made(MakeMutex(UniqueName("made")));
+    const std::string directory = UserDirectory::Open()->Path();
+    std::error_code ignored;
+    for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
+        if (std::filesystem::read_symlink(entry, ignored).string().starts_with(directory)) {
+            EXPECT_EQ(fcntl(std::stoi(entry.path().filename()), F_GETFD), FD_CLOEXEC)
+                << "no child's business, whether made or taken over";
+        }
+    }
 }
 
 /// Somebody who keeps the file locked for himself makes it unusable, but holds nobody up for good.
