@@ -232,6 +232,8 @@ TEST_F(CUsbIoPipeTest, ReadSyncReportsStatusAndBytesMoved) {
 }
 
 TEST_F(CUsbIoPipeTest, AnEventEndsTheWaitButNotTheTransfer) {
+    const Platform::OwnedHandle mutex(Platform::MakeMutex(""));
+    BackgroundThread([&] { Platform::Wait(mutex.Get(), 0); }).Join();
     const Platform::OwnedHandle event(Platform::MakeAutoResetEvent());
     driver_.Script(BulkInEndpoint, {.data = {5}, .after = 80});
     CUsbIoBuffer buffer(8);
@@ -242,8 +244,6 @@ TEST_F(CUsbIoPipeTest, AnEventEndsTheWaitButNotTheTransfer) {
     Platform::SignalEvent(event.Get());
     EXPECT_EQ(pipe_.WaitForCompletion(buffer, Platform::Infinite, event.Get()), Status::UserEvent);
     EXPECT_EQ(buffer.Status, Pending);
-    const Platform::OwnedHandle mutex(Platform::MakeMutex(""));
-    BackgroundThread([&] { Platform::Wait(mutex.Get(), 0); }).Join();
     EXPECT_EQ(pipe_.WaitForCompletion(buffer, Platform::Infinite, mutex.Get()), 0x81U) << "abandoned, second";
     EXPECT_EQ(pipe_.WaitForCompletion(buffer, Platform::Infinite, event.Get()), Status::Success);
     EXPECT_EQ(buffer.BytesTransferred, 1U);
