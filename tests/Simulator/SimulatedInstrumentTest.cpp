@@ -92,21 +92,6 @@ TEST_F(SimulatedInstrumentTest, AnswersComeOnceAndGoWithTheNextRequest) {
     ExpectSilent(BulkOutEndpoint);
 }
 
-TEST_F(SimulatedInstrumentTest, HaltedEndpointStallsUntilCleared) {
-    const auto halted = [this] {
-        return Do(TestTransfer::Control({0x82, 0, 0, BulkInEndpoint, 2}, Bytes(2)));
-    };
-    TestTransfer pending = TestTransfer::In(BulkInEndpoint, 64);
-    device_->Submit(pending);
-    Do(TestTransfer::Control({0x02, 3, 0, BulkInEndpoint, 0}, {}));
-    EXPECT_EQ(TransferStatus::Stalled, pending.status);
-    Do(TestTransfer::In(BulkInEndpoint, 64), TransferStatus::Stalled);
-    EXPECT_EQ(halted(), (Bytes{1, 0}));
-    Do(TestTransfer::Control({0x02, 1, 0, BulkInEndpoint, 0}, {}));
-    EXPECT_EQ(halted(), Bytes(2));
-    EXPECT_EQ(64U, ReadEeprom(0, 64).size());
-}
-
 TEST_F(SimulatedInstrumentTest, UnplugLosesWhatIsVolatile) {
     Do(TestTransfer::Vendor(Request::SetMeasureParameters, Bytes(8, 9)));
     Do(TestTransfer::Memory(Request::WriteEeprom, 100, 1));
