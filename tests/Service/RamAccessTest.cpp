@@ -106,6 +106,9 @@ TEST_F(RamAccessTest, WhatWasStoredIsKeptWithAnyNumberOfModes) {
     ASSERT_TRUE(Store(0.000247F));
     EXPECT_EQ(std::pair(int{instrument_.mode}, int{instrument_.p1}), std::pair(255, 25));
     EXPECT_TRUE(IsKept());
+    modes_ = {{10, 10}, {10, 10}};
+    Put(2, 10);
+    EXPECT_TRUE(Store(std::nullopt) && instrument_.mode == 1) << "no time leads to the second";
 
     for (int round = 0; round < 20000; ++round) {
         modes_.resize(1 + Random() % 4);
