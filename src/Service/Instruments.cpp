@@ -71,7 +71,7 @@ std::string ShortNameOf(const std::string& identifier) {
     // Windows: \\?\usb#vid_1234&pid_5678#NAME#{interface class}
     if (identifier.starts_with("\\\\")) {
         const std::size_t end = identifier.rfind('#');
-        const std::size_t begin = end == 0 || end == std::string::npos ? end : identifier.rfind('#', end - 1);
+        const std::size_t begin = identifier.rfind('#', end - 1);
         return begin == std::string::npos ? identifier : identifier.substr(begin + 1, end - begin - 1);
     }
     return identifier.substr(identifier.rfind('/') + 1);
