@@ -110,6 +110,7 @@ TEST_P(MemoryCommandsTest, WriteMakesABackupThatRestores) {
     EXPECT_EQ(instrument_.Eeprom(), Calibrated("5"));
     EXPECT_EQ(ReadFile(backup_), before_);
     EXPECT_EQ(tool_.Json()["backup"], backup_);
+    EXPECT_THAT(tool_.Err(), HasSubstr("backup of " + Identifier() + " written to " + backup_));
     EXPECT_GT(tool_.Json()["pieces"], 0);
     Succeed("eeprom restore @backup");
     ExpectUnchanged();

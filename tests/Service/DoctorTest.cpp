@@ -132,7 +132,8 @@ TEST(DoctorTest, TellsWhyThereIsNoLock) {
     using namespace Platform::Errors;
     for (const auto& [code, reason, advice] :
          {std::tuple(AccessDenied, std::string("it may not be written"), "sudo chmod 1777 /dev/shm"),
-          {InvalidHandle, Platform::ErrorText(InvalidHandle), "sudo mkdir -p /dev/shm"}}) {
+          {InvalidHandle, Platform::ErrorText(InvalidHandle),
+           "sudo mkdir -p /dev/shm && sudo mount -t tmpfs -o mode=1777 tmpfs /dev/shm;"}}) {
         const Failure failure = DescribeMissingLock(code);
         EXPECT_EQ(failure.Message(), "the lock that instruments need cannot be had in /dev/shm: " + reason);
         EXPECT_THAT(failure.Advice(), testing::StartsWith(advice));
