@@ -185,8 +185,9 @@ void PellandoRAM::StoreMeasureParameters(Properties& set) try {
 TRACED
 
 std::uint32_t PellandoRAM::SearchedMicroseconds(float seconds) {
-    // The double holds the product of two floats exactly; it is rounded once, to a float.
-    const auto product = static_cast<float>(seconds * MicrosecondsPerSecond);
+    // The double holds the product of two floats exactly; it is rounded once, to a float. Volatile, because
+    // an x87 register would keep it unrounded.
+    const volatile auto product = static_cast<float>(seconds * MicrosecondsPerSecond);
     return static_cast<std::uint32_t>(Truncated<std::int64_t>(product));
 }
 
