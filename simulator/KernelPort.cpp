@@ -19,7 +19,7 @@ namespace Varnholt::Simulator {
 namespace {
 
 /// Where the kernel shows its virtual USB host.
-const std::string Folder = "/sys/devices/platform/vhci_hcd.0";
+constexpr const char* Folder = "/sys/devices/platform/vhci_hcd.0";
 
 /// The port of the least used controller: devices on one controller are made ready one after the other.
 std::optional<unsigned> FindFreePort() {
@@ -28,7 +28,8 @@ std::optional<unsigned> FindFreePort() {
     std::optional<unsigned> best;
     unsigned fewestUsed = ~0U;
     for (unsigned controller = 0; controller < highest; ++controller) {
-        std::ifstream status(Folder + "/status" + (controller ? "." + std::to_string(controller) : ""));
+        std::ifstream status(std::string(Folder) + "/status" +
+                             (controller ? "." + std::to_string(controller) : ""));
         if (!status) {
             break;
         }
@@ -67,7 +68,8 @@ unsigned PlugIntoKernel(int connectedSocket, std::uint32_t deviceId) {
     const std::string order = std::to_string(*port) + " " + std::to_string(connectedSocket) + " " +
                               std::to_string(deviceId) + " " +
                               std::to_string(Platform::Usb::UsbIp::HighSpeed);
-    const Platform::Linux::FileDescriptor file(open((Folder + "/attach").c_str(), O_WRONLY | O_CLOEXEC));
+    const Platform::Linux::FileDescriptor file(
+        open((std::string(Folder) + "/attach").c_str(), O_WRONLY | O_CLOEXEC));
     if (!file || write(file.Get(), order.data(), order.size()) != static_cast<ssize_t>(order.size())) {
         throw std::runtime_error("the kernel does not take the device: " + std::string(std::strerror(errno)));
     }
