@@ -114,7 +114,7 @@ class LibUsbDevice final : public UsbDevice {
         return endpoints_;
     }
     ErrorCode Claim() override;
-    void Release() override;
+    void Release() override { libusb_release_interface(handle_.get(), InterfaceNumber); }
     ErrorCode Submit(Transfer& transfer) override;
     void Cancel(Transfer& transfer) override;
     ErrorCode ClearHalt(std::uint8_t endpoint) override {
@@ -142,14 +142,9 @@ class LibUsbDevice final : public UsbDevice {
     std::condition_variable idle_;
     std::vector<std::unique_ptr<Submission>> submissions_;
     int running_ = 0;  // transfers whose clients have not been told of their end yet
-    bool claimed_ = false;
 };
 
 ErrorCode LibUsbDevice::Claim() {
-    const std::lock_guard lock(mutex_);
-    if (claimed_) {
-        return Errors::Success;
-    }
     libusb_set_auto_detach_kernel_driver(handle_.get(), 1);
     const auto patienceEnds = std::chrono::steady_clock::now() + ClaimPatience;
     for (;;) {
@@ -161,22 +156,10 @@ ErrorCode LibUsbDevice::Claim() {
         if (result == LIBUSB_SUCCESS) {
             result = libusb_claim_interface(handle_.get(), InterfaceNumber);
         }
-        if (result == LIBUSB_SUCCESS) {
-            claimed_ = true;
-            return Errors::Success;
-        }
         if (result != LIBUSB_ERROR_NOT_FOUND || std::chrono::steady_clock::now() >= patienceEnds) {
             return ErrorFromLibUsb(result);
         }
         std::this_thread::sleep_for(ClaimRetryPause);
-    }
-}
-
-void LibUsbDevice::Release() {
-    const std::lock_guard lock(mutex_);
-    if (claimed_) {
-        libusb_release_interface(handle_.get(), InterfaceNumber);
-        claimed_ = false;
     }
 }
 
