@@ -16,14 +16,6 @@ void RunningRequest::TransferCompleted(Usb::Transfer&) noexcept {
     }
 }
 
-bool RunningRequest::AwaitEnd(std::uint32_t timeout) {
-    if (!ended.Wait(timeout)) {
-        return false;
-    }
-    ended.Signal();  // for whoever else waits
-    return true;
-}
-
 std::unique_ptr<DriverFile> OpenFile::Close() {
     {
         const std::lock_guard guard(lock_);
@@ -244,7 +236,9 @@ bool OpenFile::WaitFor(const Overlapped& record) {
             return !IsRunning(record);
         }
         const std::uint32_t limit = request->waitLimit.load(std::memory_order_relaxed);
-        if (!request->AwaitEnd(limit != 0 ? limit : Infinite)) {
+        if (request->ended.Wait(limit != 0 ? limit : Infinite)) {
+            request->ended.Signal();  // for whoever else waits
+        } else {
             GiveUp(*request);
         }
     }

@@ -37,9 +37,6 @@ struct RunningRequest final : public Usb::TransferClient,
     }
     void TransferCompleted(Usb::Transfer& completed) noexcept override;
 
-    /// False if it has not ended within `timeout` milliseconds.
-    bool AwaitEnd(std::uint32_t timeout);
-
     const std::shared_ptr<OpenFile> file;
     Overlapped& record;  ///< its caller's, who may reuse it when the request has ended
     const std::thread::id starter = std::this_thread::get_id();
