@@ -29,10 +29,11 @@ constexpr Microseconds LongestAwait = 50'000;
 /// would be waited for.
 class SchedulerOfProcess final {
   public:
-    explicit SchedulerOfProcess(RealScheduler::Starter startThread) : scheduler_(startThread) {}
+    explicit SchedulerOfProcess(RealScheduler::Starter startThread)
+        : scheduler_(std::make_unique<RealScheduler>(startThread)) {}
     ~SchedulerOfProcess() {
-        if (getpid() == process_) {
-            std::destroy_at(&*scheduler_);
+        if (getpid() != process_) {
+            (void)scheduler_.release();
         }
     }
     SchedulerOfProcess(const SchedulerOfProcess&) = delete;
@@ -42,7 +43,7 @@ class SchedulerOfProcess final {
 
   private:
     const pid_t process_ = getpid();
-    NoDestructor<RealScheduler> scheduler_;
+    std::unique_ptr<RealScheduler> scheduler_;
 };
 
 /// The system's time; threads run as the system schedules them.
