@@ -1,10 +1,12 @@
 
 #include <array>
+#include <chrono>
 #include <cstdio>
 #include <deque>
 #include <fstream>
 
 #include "ForkedProcess.h"
+#include "Platform/Linux/SharedContent.h"
 #include "TestThread.h"
 #include "UniqueName.h"
 
@@ -56,6 +58,18 @@ TEST(NamedMutexes, OfAProcessThatDiedOrClosedThemAreAbandoned) {
         EXPECT_TRUE(stage.Acquire());
         EXPECT_TRUE(ReleaseMutex(stage.mutex.Get()));
     }
+}
+
+/// Whoever sleeps meanwhile is woken at once: that is not left to the next look, which comes 50 ms later.
+TEST(NamedObjects, WakeThoseWhoAwaitTheirChange) {
+    Linux::ChangeCount changes;
+    const auto begin = std::chrono::steady_clock::now();
+    changes.Await(0, 1'050'000);
+    EXPECT_GE(std::chrono::steady_clock::now() - begin, std::chrono::microseconds(1'050'000));
+    TestThread sleeper([&] { changes.Await(0, 3'600'000'000); });
+    SleepMilliseconds(50);
+    changes.Increment();
+    sleeper.Join();
 }
 
 /// Several processes make, take and close one mutex all the time: none may end up with a mutex of its own.
