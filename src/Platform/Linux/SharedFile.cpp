@@ -9,6 +9,7 @@
 #include <cerrno>
 #include <cstdint>
 #include <cstdio>
+#include <string_view>
 #include <utility>
 
 #include "Platform/ErrorCodes.h"
@@ -17,6 +18,8 @@
 namespace Varnholt::Platform::Linux {
 namespace {
 
+/// What a name's characters stay as they are in the name of its file.
+constexpr std::string_view Usual = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789_-";
 constexpr std::size_t LongestEscapedName = 180;
 constexpr std::size_t KeptOfLongName = 120;
 /// Each attempt but the last met a process that was just letting go of the file, or just making it.
@@ -27,9 +30,7 @@ constexpr int AttemptsWithoutPause = 10;
 std::string Escaped(const std::string& name) {
     std::string escaped;
     for (const char character : name) {
-        const bool usual = (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
-                           (character >= '0' && character <= '9') || character == '_' || character == '-';
-        if (usual) {
+        if (Usual.find(character) != Usual.npos) {
             escaped += character;
         } else {
             char code[4];
