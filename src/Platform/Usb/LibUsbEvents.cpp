@@ -12,16 +12,13 @@ namespace {
 
 using std::chrono::steady_clock;
 
-/// How long after a waiting thread has handled events the own thread leaves them to the next wait. What ends
-/// while nobody waits is noticed that much later.
-constexpr auto Patience = std::chrono::milliseconds(10);
-
 /// The longest stay in libusb; who waits comes back.
 constexpr auto LongestStay = std::chrono::seconds(60);
 
 }  // namespace
 
-LibUsbEvents::LibUsbEvents(libusb_context* ownContext) : context_(ownContext) {
+LibUsbEvents::LibUsbEvents(libusb_context* ownContext, std::chrono::milliseconds patience)
+    : context_(ownContext), patience_(patience) {
     const Linux::HostSignalsBlocked blocked;
     thread_ = std::thread([this] { RunThread(); });
 }
@@ -31,7 +28,7 @@ void LibUsbEvents::RunThread() {
     while (!stopping_) {
         if (waiterHandles_) {
             const auto hasLeft = [this] { return !waiterHandles_; };
-            if (!changed_.wait_for(lock, Patience, hasLeft)) {  // who waits briefly need not wake this thread
+            if (!changed_.wait_for(lock, patience_, hasLeft)) {  // a brief wait need not wake this thread
                 threadAwaitsWaiter_ = true;
                 changed_.wait(lock, hasLeft);
                 threadAwaitsWaiter_ = false;
@@ -103,7 +100,7 @@ void LibUsbEvents::HandleEvents(std::uint64_t deadline) {
 
     const std::lock_guard lock(mutex_);
     waiterHandles_ = false;
-    leftToWaiters_ = steady_clock::now() + Patience;
+    leftToWaiters_ = steady_clock::now() + patience_;
     if (stopping_ || handlesAlways_ || threadAwaitsWaiter_) {
         changed_.notify_all();
     }

@@ -16,7 +16,10 @@ namespace Varnholt::Platform::Usb {
 class LibUsbEvents final : public CompletionSource {
   public:
     /// Throws std::system_error when no thread can be had. The context outlives the object's `Stop`.
-    explicit LibUsbEvents(libusb_context* ownContext);
+    /// `patience` is how long after a waiting thread has handled events the own thread leaves them to the
+    /// next wait: what ends while nobody waits is noticed that much later.
+    explicit LibUsbEvents(libusb_context* ownContext,
+                          std::chrono::milliseconds patience = std::chrono::milliseconds(10));
     ~LibUsbEvents() override { Stop(); }
     LibUsbEvents(const LibUsbEvents&) = delete;
     LibUsbEvents& operator=(const LibUsbEvents&) = delete;
@@ -38,6 +41,7 @@ class LibUsbEvents final : public CompletionSource {
     void RunThread();
 
     libusb_context* const context_;
+    const std::chrono::milliseconds patience_;
     int interrupted_ = 0;  ///< read by libusb as well, between its own lock and its wait
 
     std::mutex mutex_;  ///< guards what follows

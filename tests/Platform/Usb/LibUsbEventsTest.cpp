@@ -72,6 +72,13 @@ TEST_F(LibUsbEventsTest, OneThreadHandlesThemAndTheirOwnWhereNobodyWaits) {
     events_->Stop();
     EXPECT_FALSE(events_->TryBegin());
     EXPECT_FALSE(IsHandled());
+
+    LibUsbEvents patient(context_, std::chrono::hours(1));
+    EXPECT_TRUE(patient.TryBegin());
+    patient.HandleEvents(ClockScheduler().Now());
+    Tests::WaitUntil([this] { return !IsHandled(); });
+    patient.HandleNow();
+    Tests::WaitUntil([this] { return IsHandled(); });
 }
 
 TEST_F(LibUsbEventsTest, TheirEndAwaitsNobodyWhoIsAboutToWait) {
