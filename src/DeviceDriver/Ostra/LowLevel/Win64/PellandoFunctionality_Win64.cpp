@@ -4,6 +4,7 @@
 #include <array>
 #include <cstring>
 #include <iterator>
+#include <limits>
 #include <list>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
@@ -35,7 +36,7 @@ constexpr std::uint64_t ReadGrace = 5000;  // milliseconds on top of every time-
 // Scans.
 constexpr std::uint32_t ScanTransferSize = MaximumTransferSize;
 constexpr std::uint32_t OpenEndedScanStartSize = 1280000;
-constexpr std::uint64_t MaximumScanSize = 0xFFFFFFFF;  // what the callers can count
+constexpr std::uint64_t MaximumScanSize = std::numeric_limits<std::uint32_t>::max();  // callers' counts
 constexpr std::uint32_t ScanRecordSize = 256;
 constexpr std::uint32_t ScanRecordTime = 15;  // milliseconds that the instrument may take for one
 
