@@ -1,7 +1,6 @@
 #include <array>
 #include <cstdio>
 
-#include "Terminal.h"
 #include "ToolFixture.h"
 
 namespace Varnholt::Tests {

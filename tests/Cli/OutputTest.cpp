@@ -9,7 +9,6 @@
 
 #include "Output/Json.h"
 #include "Output/LiveBlock.h"
-#include "Output/Plot.h"
 #include "Output/ProgressLine.h"
 #include "Output/RecordingFile.h"
 #include "Output/Rows.h"

@@ -5,7 +5,6 @@
 
 #include "Interface/Readout.h"
 #include "ostra.h"
-#include "Protocol/Instrument.h"
 #include "Support/ScriptedDriver.h"
 #include "Support/SimulatedHost.h"
 #include "Support/TestClock.h"

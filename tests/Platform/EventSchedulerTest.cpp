@@ -1,8 +1,3 @@
-
-#include <atomic>
-#include <memory>
-#include <thread>
-
 #include "EachClock.h"
 #include "Platform/RealScheduler.h"
 #include "TestThread.h"

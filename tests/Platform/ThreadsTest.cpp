@@ -1,7 +1,3 @@
-
-#include <atomic>
-#include <thread>
-
 #include "EachClock.h"
 #include "TestThread.h"
 

@@ -1,12 +1,7 @@
-
 #include <array>
-#include <atomic>
 #include <deque>
-#include <mutex>
-#include <vector>
 
 #include "EachClock.h"
-#include "Platform/Time.h"
 #include "TestThread.h"
 #include "UniqueName.h"
 

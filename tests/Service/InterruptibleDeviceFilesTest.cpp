@@ -1,5 +1,4 @@
 #include "DeviceDriver/Ostra/LowLevel/PellandoFunctionality.h"
-#include "Platform/Owned.h"
 #include "Service/InterruptibleDeviceFiles.h"
 #include "Service/Interruption.h"
 #include "Support/DriverTest.h"

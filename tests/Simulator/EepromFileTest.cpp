@@ -1,6 +1,5 @@
 #include <gmock/gmock.h>
 
-#include <memory>
 #include <stdexcept>
 
 #include "EepromFile.h"

@@ -1,6 +1,3 @@
-
-#include <memory>
-
 #include "FaultInjector.h"
 #include "Platform/Threads.h"
 #include "SimulatedBus.h"

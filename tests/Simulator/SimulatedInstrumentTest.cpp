@@ -1,4 +1,3 @@
-
 #include "Platform/Threads.h"
 #include "SchedulerInForce.h"
 #include "SimulatedInstrument.h"

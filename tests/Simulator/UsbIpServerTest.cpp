@@ -4,9 +4,7 @@
 #include <poll.h>
 #include <sys/socket.h>
 
-#include <algorithm>
 #include <future>
-#include <memory>
 #include <stdexcept>
 
 #include "Platform/Linux/ForkedProcess.h"

@@ -13,9 +13,7 @@
 
 #include "ostra.h"
 #include "Platform/Threads.h"
-#include "Platform/Usb/UsbDevice.h"
 #include "Platform/WaitableObjects.h"
-#include "Protocol/Instrument.h"
 #include "Support/ResourceCount.h"
 #include "Support/SimulatedHost.h"
 #include "UsbIo/CUsbIoReader.h"

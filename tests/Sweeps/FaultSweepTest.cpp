@@ -16,7 +16,6 @@
 #include "FreshEeprom.h"
 #include "ostra.h"
 #include "Protocol/EepromMap.h"
-#include "Protocol/Instrument.h"
 #include "Service/Memory/ImageModel.h"
 #include "Support/FaultText.h"
 #include "Support/SimulatedHost.h"

@@ -1,4 +1,3 @@
-
 #include <limits>
 #include <map>
 #include <memory>

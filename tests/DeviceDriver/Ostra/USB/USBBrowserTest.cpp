@@ -1,4 +1,3 @@
-
 #include "DeviceDriver/Ostra/LowLevel/Win32/PellandoUSBDevice.h"
 #include "DeviceDriver/Ostra/USB/USBBrowser.h"
 #include "Support/DriverTest.h"
