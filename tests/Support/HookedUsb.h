@@ -28,6 +28,7 @@ class HookedDevice final : public Platform::Usb::UsbDevice {
     std::function<void(Transfer&)> onCancel = [](Transfer& transfer) {
         Complete(transfer, TransferStatus::Cancelled, 0);
     };
+    std::function<void()> onClose = [] {};
     ErrorCode claimAnswer = 0, endpointsAnswer = 0, haltAnswer = 0;
     bool isClaimed = false;
     int opened = 0, handles = 0, claims = 0, submissions = 0, cancellations = 0;
@@ -139,6 +140,7 @@ class HookedBus final : public Platform::Usb::UsbBus {
         return {device.get(), [device](HookedDevice*) {
                     --device->handles;
                     device->isClaimed = false;
+                    std::exchange(device->onClose, [] {})();
                 }};
     }
 };

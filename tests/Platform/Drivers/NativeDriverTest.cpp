@@ -47,6 +47,17 @@ TEST_F(NativeDriver, FilesShareOneClaimedDevice) {
     EXPECT_EQ(OpenError("native/port1"), Errors::Success);
 }
 
+TEST_F(NativeDriver, IsNotOpenedAgainBeforeItHasClosed) {
+    std::thread again;
+    device_->onClose = [&] {
+        again = std::thread([&] { Open("native/port1"); });
+        Platform::SleepMilliseconds(20);
+        EXPECT_EQ(device_->opened, 1);
+    };
+    EXPECT_TRUE(files_->CloseFile(Open("native/port1")));
+    again.join();
+}
+
 TEST_F(NativeDriver, RefusesWhatAFileDoesNotTake) {
     constexpr std::uint32_t Vendor = Native::ControlVendorRequest, Abort = Native::ControlAbortPipe;
     const auto main = Open("native/port1");
