@@ -55,7 +55,9 @@ TEST_F(EventReaders, AFailureNamesItsInstrumentAndWhetherThatHasGone) {
 TEST_F(EventReaders, TellARemovalFromMessagesThatEndForAnotherReason) {
     EventReader reader(mailbox_, instrument_);
     mailbox_.MessageFromDevice(DeviceDriver::Generic::MessageDeviceGone, 0);
+    const Stopwatch watch(clock_);
     EXPECT_THROW(reader.Next(), Failure);
+    watch.ExpectAtMost(1000);
     mailbox_.MessageFromDevice(DeviceDriver::Generic::MessageDeviceGone, 0);
     // A system may list it for a moment after it has gone.
     auto& scheduler = Platform::ClockScheduler();
