@@ -11,10 +11,8 @@ void ScanBuffer::Freer::operator()(std::uint8_t* bytes) const noexcept {
 }
 
 void ScanBuffer::Reset(std::size_t newSize) {
-    size_ = 0;
     if (capacity_ < newSize) {
-        memory_.reset();
-        capacity_ = 0;
+        *this = {};
         memory_.reset(static_cast<std::uint8_t*>(std::calloc(newSize, 1)));
         if (!memory_) {
             throw std::bad_alloc();
