@@ -130,21 +130,17 @@ ErrorCode UsbIpDevice::Claim() {
         return error;
     }
     socket_ = std::move(newSocket);
-    {
-        const std::lock_guard lock(mutex_);
-        connected_ = true;
-        releaseLimit_.reset();
-    }
+    const std::lock_guard lock(mutex_);  // what the reader finds comes after what is set here
     try {
         const Linux::HostSignalsBlocked blocked;
         reader_ = std::thread([this] { Listen(); });
     } catch (const std::exception&) {  // no thread, or no memory for it
         socket_.reset();
-        const std::lock_guard lock(mutex_);
-        connected_ = false;
-        error = Errors::NoSystemResources;
+        return Errors::NoSystemResources;
     }
-    return error;
+    connected_ = true;
+    releaseLimit_.reset();
+    return Errors::Success;
 }
 
 void UsbIpDevice::Release() {
