@@ -1,15 +1,9 @@
 // The first, second, third... allocation of a call fails, until one gets by without a failure.
 #include <gmock/gmock.h>
 
-#include <array>
-#include <atomic>
 #include <cstdio>
 #include <cstdlib>
-#include <functional>
-#include <mutex>
 #include <new>
-#include <utility>
-#include <vector>
 
 #include "ostra.h"
 #include "Platform/Threads.h"

@@ -3,13 +3,8 @@
 // a log is left in its memory and nothing else is touched.
 #include <gmock/gmock.h>
 
-#include <array>
-#include <functional>
 #include <numeric>
 #include <regex>
-#include <span>
-#include <utility>
-#include <vector>
 
 #include "DeviceDriver/Generic/Utilities/DriverExceptions.h"
 #include "DeviceDriver/Ostra/LowLevel/PellandoEEPROM.h"
