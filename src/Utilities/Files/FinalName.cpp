@@ -19,7 +19,6 @@ bool RenameIfFree(const Files::path& partial, const Files::path& target, std::er
         return true;
     }
     if (error == std::errc::file_exists || Files::exists(target, error)) {
-        error.clear();
         return false;
     }
     Files::rename(partial, target, error);
