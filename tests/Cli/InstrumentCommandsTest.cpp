@@ -136,9 +136,7 @@ TEST_P(InstrumentCommandsTest, ReadoutsThatWereTakenAreKept) {
         host_.Add("sim", Leisurely);
         SetFaults(faults);
         WriteFile(folder_.Path("csv"), {1});
-        Service::Interruption interruption;
-        tool_.interruption = &interruption;
-        After(interruptedAt, [&] { interruption.Request(); });
+        After(interruptedAt, [this] { tool_.interruption.Request(); });
         Fail(std::string("readout --csv --repeat ") + repeat + " --interval 1 --output @csv", code, text);
         ForgetEvents();
         const bool isReplaced = code == ExitCode::Success && lines > 0;
@@ -215,12 +213,9 @@ TEST_P(InstrumentCommandsTest, MonitorReportsButtonAndRemovalAndEndsInTime) {
     Succeed("monitor --for 3");
     watch.ExpectBetween(3000, 3100);
     EXPECT_EQ(tool_.Out(), "");
-    Service::Interruption interruption;
-    tool_.interruption = &interruption;
-    After(1'000'000, [&] { interruption.Request(); });
+    After(1'000'000, [this] { tool_.interruption.Request(); });
     Succeed("monitor");
     EXPECT_EQ(tool_.Out(), "") << "an end that the user wants is no removal";
-    tool_.interruption = nullptr;
     After(1'000'000, [&] { instrument.PressButton(); });
     After(2'000'000, [&] { host_.Bus().Unplug("sim"); });
     Succeed("monitor --json");

@@ -247,8 +247,6 @@ TEST_P(MemoryCommandsTest, PipesAreNotWaitedForWithoutEnd) {
     tool_.inputPatience = 1;
     Fail("eeprom check @pipe", ExitCode::File, "nothing comes from " + pipe);
     tool_.inputPatience = std::numeric_limits<std::uint32_t>::max();
-    Service::Interruption interruption;
-    tool_.interruption = &interruption;
     const auto write = [&](const std::function<void(std::ofstream & file)>& action) {
         return std::thread([&pipe, action] {
             std::ofstream file(pipe, std::ios::binary);  // opened when the tool reads
@@ -262,7 +260,7 @@ TEST_P(MemoryCommandsTest, PipesAreNotWaitedForWithoutEnd) {
     });
     Succeed("eeprom diff @pipe --device sim");
     writer.join();
-    writer = write([&interruption](std::ofstream&) { interruption.Request(); });
+    writer = write([this](std::ofstream&) { tool_.interruption.Request(); });
     Fail("eeprom write @pipe", ExitCode::Interrupted);
     writer.join();
     ExpectUnchanged();
@@ -274,11 +272,9 @@ TEST_P(MemoryCommandsTest, CtrlCEndsAWriteBetweenTwoPieces) {
     EepromImage wanted = before_;
     std::fill(wanted.begin() + 5000, wanted.end(), std::uint8_t{0x77});
     WriteFile(image_, wanted);
-    Service::Interruption interruption;
-    tool_.interruption = &interruption;
     // In the middle of the fifth piece.
     SetFaults("bulk-out 12:late=400");
-    After(300'000, [&] { interruption.Request(); });
+    After(300'000, [this] { tool_.interruption.Request(); });
     Fail("eeprom write @image --backup @backup", ExitCode::Interrupted);
     EXPECT_THAT(tool_.Err(),
                 testing::AllOf(HasSubstr("interrupted; 5 of 13 pieces"), HasSubstr("eeprom restore")));

@@ -121,13 +121,12 @@ TEST_P(ScanTest, ProgressOnATerminalAndASummary) {
 /// Whatever ends a scan too early: what came is kept, as whole records, and the exit code and the text say
 /// why it ended. The instrument can be used afterwards.
 TEST_P(ScanTest, WhatCameIsKept) {
-    const auto interrupt = [](Service::Interruption& user) { user.Request(); };
-    const auto unplug = [this](auto&) { host_.Bus().Unplug("sim"); };
-    const auto nothing = [](auto&) {};
+    const auto interrupt = [this] { tool_.interruption.Request(); };
+    const auto unplug = [this] { host_.Bus().Unplug("sim"); };
+    const auto nothing = [] {};
     // The event comes after 5 s.
-    for (const auto& [faults, event, code, ended, text, hasRecords] :
-         std::vector<std::tuple<const char*, std::function<void(Service::Interruption&)>, ExitCode,
-                                std::string, const char*, bool>>{
+    for (const auto& [faults, event, code, ended, text, hasRecords] : std::vector<
+             std::tuple<const char*, std::function<void()>, ExitCode, std::string, const char*, bool>>{
              {"", interrupt, ExitCode::Interrupted, "interrupted", "scan interrupted; ", true},
              {"", unplug, ExitCode::NoInstrument, "unplugged", "", true},
              {"bulk-in 4+:silent", nothing, ExitCode::Timeout, "timeout", "", true},
@@ -143,9 +142,7 @@ TEST_P(ScanTest, WhatCameIsKept) {
             SCOPED_TRACE(ended + ", " + how + " " + faults);
             auto& instrument = host_.Add("sim", Streaming(100'000'000, 100'000));
             SetFaults(faults);
-            Service::Interruption interruption;
-            tool_.interruption = &interruption;
-            After(5'000'000, [&, event = event] { event(interruption); });
+            After(5'000'000, event);
             const Stopwatch watch(clock_);
             Fail(std::string("scan --raw --json --timeout 2 --output @raw") +
                      (how == "discarded" ? " --discard" : "") +
@@ -171,7 +168,6 @@ TEST_P(ScanTest, WhatCameIsKept) {
             EXPECT_EQ(folder_.Files().size(), 0u);
             EXPECT_EQ(instrument.PendingTransfers(), 0u);
             EXPECT_FALSE(instrument.Claimed());
-            tool_.interruption = nullptr;
             if (code == ExitCode::Interrupted) {
                 EXPECT_EQ(instrument.WithCommands([](const auto& commands) { return commands.resets; }), 2u);
                 Succeed("readout");
@@ -210,9 +206,7 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
     host_.Add("sim", Streaming(102'400, 40'000));
     for (std::uint64_t after = 0; after < 4'000; after += 100) {
         SCOPED_TRACE(after);
-        Service::Interruption interruption;
-        tool_.interruption = &interruption;
-        After(after * 1000, [&] { interruption.Request(); });
+        After(after * 1000, [this] { tool_.interruption.Request(); });
         const Stopwatch watch(clock_);
         const ExitCode code = tool_.Run("scan --raw --output @raw");
         ForgetEvents();
@@ -228,7 +222,6 @@ TEST_P(ScanTest, CtrlCAtAnyTime) {
             std::filesystem::remove(folder_.Path("raw"));
         }
     }
-    tool_.interruption = nullptr;
     Succeed("scan --output @csv");
 }
 

@@ -29,8 +29,8 @@ class ToolRunner {
         err_.str({});
         log_.str({});
         Cli::Streams streams{out_, err_, log_, outFacts, errFacts, inputPatience};
-        Service::Interruption none;
-        return Cli::RunTool(arguments, streams, interruption != nullptr ? *interruption : none);
+        interruption.Withdraw();
+        return Cli::RunTool(arguments, streams, interruption);
     }
     /// From now on nothing can be written to standard output.
     void CloseOut() { out_.setstate(std::ios::badbit); }
@@ -51,7 +51,7 @@ class ToolRunner {
     const TestFolder folder{};
     Cli::StreamFacts outFacts, errFacts;
     std::uint32_t inputPatience = 30'000;
-    Service::Interruption* interruption = nullptr;
+    Service::Interruption interruption;  ///< of the command that runs
 
   private:
     std::ostringstream out_, err_, log_;
