@@ -29,10 +29,8 @@ class EepromFileTest : public testing::Test {
     static void WriteByte(const std::shared_ptr<SimulatedInstrument>& instrument, std::uint8_t address,
                           std::uint8_t value) {
         const auto device = SimulatedInstrument::Connect(instrument);
-        TestTransfer request = TestTransfer::Memory(Request::WriteEeprom, address, 1);
-        TestTransfer data = TestTransfer::Out(Protocol::BulkOutEndpoint, {value});
-        device->Submit(request);
-        device->Submit(data);
+        Tests::Do(*device, TestTransfer::Memory(Request::WriteEeprom, address, 1));
+        Tests::Do(*device, TestTransfer::Out(Protocol::BulkOutEndpoint, {value}));
     }
 
     const Tests::TestFolder folder_;

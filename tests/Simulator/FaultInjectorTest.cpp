@@ -26,12 +26,6 @@ class FaultInjectorTest : public testing::Test {
         Platform::ErrorCode error = Errors::Success;
         return bus_.Open("one", error);
     }
-    /// Has the instrument send its memory from `address` on.
-    static void AskForMemory(UsbDevice& device, std::uint32_t address) {
-        TestTransfer request = TestTransfer::Memory(Request::ReadEeprom, address, ReadLength);
-        EXPECT_EQ(Errors::Success, device.Submit(request));
-        EXPECT_EQ(TransferStatus::Completed, request.status);
-    }
 
     const TestClock clock_{TestTime::Virtual};
     SimulatedBus bus_{Platform::ClockScheduler()};
@@ -65,9 +59,9 @@ TEST_F(FaultInjectorTest, FaultsOfABulkReadAndWhatComesNext) {
             EXPECT_EQ(1, transfer.completions);
             return std::pair(transfer.status, transfer.Data());
         };
-        AskForMemory(*device, 200);
-        EXPECT_EQ(Counting(ReadLength, 200), read(TestTransfer::In(BulkInEndpoint, ReadLength)).second);
-        AskForMemory(*device, 10);
+        Do(*device, TestTransfer::Memory(Request::ReadEeprom, 200, ReadLength));
+        EXPECT_EQ(Counting(ReadLength, 200), Do(*device, TestTransfer::In(BulkInEndpoint, ReadLength)));
+        Do(*device, TestTransfer::Memory(Request::ReadEeprom, 10, ReadLength));
         EXPECT_EQ(std::pair(status, data), read(TestTransfer::In(BulkInEndpoint, ReadLength)));
         if (status == TransferStatus::Stalled) {
             EXPECT_EQ(status, read(TestTransfer::In(BulkInEndpoint, ReadLength)).first)
@@ -98,13 +92,10 @@ TEST_F(FaultInjectorTest, FaultsOfABulkWrite) {
         SimulatedInstrument& instrument = bus_.Instrument("one");
         instrument.SetEeprom(Counting(Protocol::EepromSize));
         const auto device = Open("bulk-out 1:" + std::string(fault));
-        TestTransfer before = TestTransfer::Memory(Request::WriteEeprom, 100, 1);
-        TestTransfer beforeData = TestTransfer::Out(BulkOutEndpoint, {0x99});
-        TestTransfer request = TestTransfer::Memory(Request::WriteEeprom, 0, 4);
+        Do(*device, TestTransfer::Memory(Request::WriteEeprom, 100, 1));
+        Do(*device, TestTransfer::Out(BulkOutEndpoint, {0x99}));
+        Do(*device, TestTransfer::Memory(Request::WriteEeprom, 0, 4));
         TestTransfer data = TestTransfer::Out(BulkOutEndpoint, sent);
-        for (TestTransfer* const each : {&before, &beforeData, &request}) {
-            device->Submit(*each);
-        }
         if (std::string(fault) == "gone-before") {
             EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(data));
             EXPECT_EQ(0, data.completions);
@@ -125,7 +116,7 @@ TEST_F(FaultInjectorTest, LateTransferReachesTheInstrumentLater) {
         GTEST_SKIP() << "hangs on milliseconds";
     }
     auto device = Open("bulk-in 0+:late=20");
-    AskForMemory(*device, 10);
+    Do(*device, TestTransfer::Memory(Request::ReadEeprom, 10, ReadLength));
     TestTransfer cancelled = TestTransfer::In(BulkInEndpoint, ReadLength);
     device->Submit(cancelled);
     SleepMilliseconds(19);

@@ -14,16 +14,9 @@ using namespace Tests;
 
 class SimulatedInstrumentTest : public testing::Test {
   protected:
-    /// Submits a transfer that must be done at once and answers its data.
-    Bytes Do(TestTransfer&& transfer, TransferStatus status = TransferStatus::Completed) {
-        EXPECT_EQ(Errors::Success, device_->Submit(transfer));
-        EXPECT_EQ(1, transfer.completions);
-        EXPECT_EQ(status, transfer.status);
-        return transfer.Data();
-    }
     Bytes ReadEeprom(std::uint32_t address, std::uint16_t length) {
-        Do(TestTransfer::Memory(Request::ReadEeprom, address, length));
-        return Do(TestTransfer::In(BulkInEndpoint, length));
+        Do(*device_, TestTransfer::Memory(Request::ReadEeprom, address, length));
+        return Do(*device_, TestTransfer::In(BulkInEndpoint, length));
     }
     /// A transfer gets nothing, and ends once with its cancellation.
     void ExpectSilent(std::uint8_t endpoint) {
@@ -33,8 +26,7 @@ class SimulatedInstrumentTest : public testing::Test {
         EXPECT_EQ(1U, instrument_->PendingTransfers());
         device_->Cancel(transfer);
         device_->Cancel(transfer);
-        EXPECT_EQ(1, transfer.completions);
-        EXPECT_EQ(TransferStatus::Cancelled, transfer.status);
+        transfer.ExpectEnd(TransferStatus::Cancelled);
     }
 
     const std::shared_ptr<SimulatedInstrument> instrument_ =
@@ -62,39 +54,39 @@ TEST_F(SimulatedInstrumentTest, RefusesWhatItCannotDo) {
         SCOPED_TRACE(name);
         SetupPacket setup = request;
         setup.length = static_cast<std::uint16_t>(data.size());
-        EXPECT_EQ(Bytes(), Do(TestTransfer::Control(setup, data), TransferStatus::Stalled));
+        EXPECT_EQ(Bytes(), Do(*device_, TestTransfer::Control(setup, data), TransferStatus::Stalled));
     }
     // A refused setup does not halt endpoint 0.
-    EXPECT_EQ(8U, Do(TestTransfer::VendorQuestion(Request::GetChipId, 8)).size());
+    EXPECT_EQ(8U, Do(*device_, TestTransfer::VendorQuestion(Request::GetChipId, 8)).size());
 }
 
 TEST_F(SimulatedInstrumentTest, AnswersComeOnceAndGoWithTheNextRequest) {
     TestTransfer early = TestTransfer::In(BulkInEndpoint, 256);
     device_->Submit(early);
     EXPECT_EQ(0, early.completions) << "nothing was asked for yet";
-    Do(TestTransfer::Vendor(Request::Measure));
+    Do(*device_, TestTransfer::Vendor(Request::Measure));
     EXPECT_EQ(256U, early.Data().size());
     // It was taken whole, so an empty transfer tells the end; then the endpoint is silent.
-    EXPECT_EQ(0U, Do(TestTransfer::In(BulkInEndpoint, 256)).size());
+    EXPECT_EQ(0U, Do(*device_, TestTransfer::In(BulkInEndpoint, 256)).size());
     ExpectSilent(BulkInEndpoint);
 
-    Do(TestTransfer::Vendor(Request::Measure));
-    Do(TestTransfer::In(BulkInEndpoint, 100));
+    Do(*device_, TestTransfer::Vendor(Request::Measure));
+    Do(*device_, TestTransfer::In(BulkInEndpoint, 100));
     const Bytes memory = instrument_->Eeprom();
     EXPECT_EQ(Bytes(memory.begin(), memory.begin() + 64), ReadEeprom(0, 64));
     ExpectSilent(BulkInEndpoint);  // memory of a length that the host named has no end mark
 
-    Do(TestTransfer::Vendor(Request::Measure));
-    Do(TestTransfer::Memory(Request::WriteEeprom, 0, 2));
-    Do(TestTransfer::Vendor(Request::Reset, {31}));
+    Do(*device_, TestTransfer::Vendor(Request::Measure));
+    Do(*device_, TestTransfer::Memory(Request::WriteEeprom, 0, 2));
+    Do(*device_, TestTransfer::Vendor(Request::Reset, {31}));
     ExpectSilent(BulkInEndpoint);
     ExpectSilent(BulkOutEndpoint);
 }
 
 TEST_F(SimulatedInstrumentTest, UnplugLosesWhatIsVolatile) {
-    Do(TestTransfer::Vendor(Request::SetMeasureParameters, Bytes(8, 9)));
-    Do(TestTransfer::Memory(Request::WriteEeprom, 100, 1));
-    Do(TestTransfer::Out(BulkOutEndpoint, {42}));
+    Do(*device_, TestTransfer::Vendor(Request::SetMeasureParameters, Bytes(8, 9)));
+    Do(*device_, TestTransfer::Memory(Request::WriteEeprom, 100, 1));
+    Do(*device_, TestTransfer::Out(BulkOutEndpoint, {42}));
     instrument_->Unplug();
     TestTransfer after = TestTransfer::In(BulkInEndpoint, 64);
     EXPECT_EQ(Errors::DeviceNotConnected, device_->Submit(after));

@@ -91,14 +91,6 @@ class ServerThread final {
     std::thread thread_;
 };
 
-/// Does a transfer and answers the bytes that came.
-Bytes Do(UsbDevice& device, TestTransfer&& transfer, TransferStatus status = TransferStatus::Completed) {
-    EXPECT_EQ(Errors::Success, device.Submit(transfer));
-    EXPECT_TRUE(transfer.Wait());
-    EXPECT_EQ(status, transfer.status);
-    return transfer.Data();
-}
-
 class UsbIpServerTest : public testing::Test {
   protected:
     static std::shared_ptr<UsbDevice> Open(const std::string& name,

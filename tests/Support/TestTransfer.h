@@ -1,5 +1,7 @@
 #pragma once
 
+#include <gtest/gtest.h>
+
 #include <array>
 #include <atomic>
 #include <chrono>
@@ -67,6 +69,11 @@ struct TestTransfer final : Platform::Usb::Transfer, private Platform::Usb::Tran
         std::unique_lock lock(mutex_);
         return changed_.wait_for(lock, patience, [this] { return completions > 0; });
     }
+    /// It has ended, or does so soon, once and with this status.
+    void ExpectEnd(Platform::Usb::TransferStatus expected) {
+        EXPECT_TRUE(Wait());
+        EXPECT_EQ(std::pair(expected, 1), std::pair(status, completions.load()));
+    }
     Bytes Data() const {
         return {buffer.begin(), buffer.begin() + static_cast<std::ptrdiff_t>(actualLength)};
     }
@@ -90,5 +97,14 @@ struct TestTransfer final : Platform::Usb::Transfer, private Platform::Usb::Tran
     std::mutex mutex_;
     std::condition_variable changed_;
 };
+
+/// Does a transfer and gives the bytes that came.
+inline TestTransfer::Bytes Do(
+    Platform::Usb::UsbDevice& device, TestTransfer&& transfer,
+    Platform::Usb::TransferStatus status = Platform::Usb::TransferStatus::Completed) {
+    EXPECT_EQ(Errors::Success, device.Submit(transfer));
+    transfer.ExpectEnd(status);
+    return transfer.Data();
+}
 
 }  // namespace Varnholt::Tests

@@ -106,13 +106,11 @@ TEST_F(UsbIpDeviceTest, ImportAndPacketsAreWhatTheProtocolSays) {
 
     // Answered in the other order.
     PeerSends(Join(UsbIp::Encode(UsbIp::SubmitReply{second.sequence, 0, 3}), Bytes{7, 8, 9}));
-    ASSERT_TRUE(readout.Wait());
-    EXPECT_EQ(TransferStatus::Completed, readout.status);
+    readout.ExpectEnd(TransferStatus::Completed);
     EXPECT_EQ((Bytes{7, 8, 9}), readout.Data());
     EXPECT_EQ(0, request.completions);
     PeerSends(UsbIp::Encode(UsbIp::SubmitReply{first.sequence, -32, 0}));
-    ASSERT_TRUE(request.Wait());
-    EXPECT_EQ(TransferStatus::Stalled, request.status);
+    request.ExpectEnd(TransferStatus::Stalled);
 }
 
 TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
@@ -127,13 +125,14 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
              {"unlinked with data", -104, {1, 2}, 0, TransferStatus::Cancelled},
              {"the peer believes it has answered", std::nullopt, {}, 0, TransferStatus::Cancelled},
          }) {
+        SCOPED_TRACE(name);
         TestTransfer transfer = TestTransfer::In(BulkInEndpoint, 4);
         ASSERT_EQ(Errors::Success, device->Submit(transfer));
         const auto submit = PeerReceivesPacket<UsbIp::SubmitPacket>();
         device->Cancel(transfer);
         device->Cancel(transfer);
         const auto unlink = PeerReceivesPacket<UsbIp::UnlinkPacket>();
-        EXPECT_EQ(submit.sequence, unlink.victim) << name;
+        EXPECT_EQ(submit.sequence, unlink.victim);
         if (submitStatus) {
             const auto length = static_cast<std::uint32_t>(data.size());
             PeerSends(Join(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, *submitStatus, length}), data));
@@ -143,9 +142,8 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
         } else {
             std::this_thread::sleep_for(std::chrono::milliseconds(1100));  // there is no limit any more
         }
-        ASSERT_TRUE(transfer.Wait()) << name;
-        EXPECT_EQ(expected, transfer.status) << name;
-        EXPECT_EQ(data, transfer.Data()) << name;
+        transfer.ExpectEnd(expected);
+        EXPECT_EQ(data, transfer.Data());
         device->Cancel(transfer);
     }
     // The connection has survived it, and nothing more was sent.
@@ -155,8 +153,7 @@ TEST_F(UsbIpDeviceTest, CancellationAndItsCrossings) {
         << "a cancellation that was answered has no limit";
     const auto submit = PeerReceivesPacket<UsbIp::SubmitPacket>();
     PeerSends(Join(UsbIp::Encode(UsbIp::SubmitReply{submit.sequence, 0, 1}), Bytes{9}));
-    ASSERT_TRUE(last.Wait());
-    EXPECT_EQ(1, last.completions);
+    last.ExpectEnd(TransferStatus::Completed);
 }
 
 TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
@@ -186,8 +183,7 @@ TEST_F(UsbIpDeviceTest, PeerThatLeavesOrBreaksTheProtocolIsAnUnpluggedDevice) {
             ClosePeer();
         }
         for (TestTransfer* const each : {&first, &second}) {
-            ASSERT_TRUE(each->Wait());
-            EXPECT_EQ(TransferStatus::DeviceGone, each->status);
+            each->ExpectEnd(TransferStatus::DeviceGone);
             EXPECT_EQ(0U, each->actualLength);
         }
         TestTransfer after = TestTransfer::In(BulkInEndpoint, 64);
@@ -212,8 +208,7 @@ TEST_F(UsbIpDeviceTest, SilentPeerDoesNotHoldUpACancellation) {
     const auto start = Clock::now();
     device->Cancel(cancelled);
     for (TestTransfer* const each : {&cancelled, &other}) {
-        ASSERT_TRUE(each->Wait());
-        EXPECT_EQ(TransferStatus::DeviceGone, each->status);
+        each->ExpectEnd(TransferStatus::DeviceGone);
     }
     EXPECT_LT(Clock::now() - start, std::chrono::seconds(3));
 }
@@ -231,9 +226,8 @@ TEST_F(UsbIpDeviceTest, PeerMayReadSlowlyButHoldsUpNoSubmissionForEver) {
     TestTransfer large = TestTransfer::Out(BulkOutEndpoint, Bytes(size));
     const auto start = Clock::now();
     ASSERT_EQ(Errors::Success, device->Submit(large));
-    ASSERT_TRUE(large.Wait());
+    large.ExpectEnd(TransferStatus::DeviceGone);
     EXPECT_LT(Clock::now() - start, std::chrono::seconds(5));
-    EXPECT_EQ(TransferStatus::DeviceGone, large.status);
     TestTransfer largest = TestTransfer::Out(BulkOutEndpoint, Bytes(UsbIp::MaximumPayload));
     EXPECT_EQ(Errors::DeviceNotConnected, device->Submit(largest));
     TestTransfer tooLarge = TestTransfer::Out(BulkOutEndpoint, Bytes(UsbIp::MaximumPayload + std::size_t{1}));
