@@ -24,10 +24,7 @@ class RegisterTest : public testing::Test {
     ExitCode Register(const std::string& line) {
         return tool_.Run("register " + line + " --file @rules.d/70-ostra.rules");
     }
-    std::string Rules() {
-        const auto bytes = ReadFile(file_);
-        return {bytes.begin(), bytes.end()};
-    }
+    std::string Rules() { return ReadText(file_); }
 
     ToolRunner tool_;
     const std::string file_ = tool_.folder.Path("rules.d/70-ostra.rules");

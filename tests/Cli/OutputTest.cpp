@@ -122,10 +122,7 @@ using Names = std::vector<std::string>;
 
 class FileTest : public testing::Test {
   protected:
-    std::string Content(const std::string& name) {
-        const Bytes bytes = ReadFile(folder_.Path(name));
-        return {bytes.begin(), bytes.end()};
-    }
+    std::string Content(const std::string& name) { return ReadText(folder_.Path(name)); }
 
     TestFolder folder_;
     const std::string path_ = folder_.Path("f");

@@ -19,6 +19,7 @@
 #include "Platform/Usb/UdevBus.h"
 #include "Support/Bytes.h"
 #include "Support/ResourceCount.h"
+#include "Support/TestFolder.h"
 
 namespace Varnholt::Tests {
 namespace {
@@ -166,8 +167,7 @@ TEST_P(OnKernel, TakesTheInterfaceFromAKernelDriverAndGivesItBack) {
     ASSERT_TRUE(WaitFor([] { return InterfaceDriver() == "usbtest"; })) << InterfaceDriver();
     // The simulator itself, which the kernel uses, is a finding of its own.
     (void)!std::system("./ostra doctor > doctor.txt 2> /dev/null");
-    std::ifstream file("doctor.txt");
-    EXPECT_THAT(std::string(std::istreambuf_iterator<char>(file), {}),
+    EXPECT_THAT(ReadText("doctor.txt"),
                 testing::MatchesRegex("note: usb-.*kernel driver usbtest holds its interface; it gives way.*"
                                       "good: usb-.*answers \\(firmware.*"));
     EXPECT_EQ(InterfaceDriver(), "usbtest") << "the doctor has opened the instrument and closed it";

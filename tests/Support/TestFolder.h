@@ -51,6 +51,11 @@ inline std::vector<std::uint8_t> ReadFile(const std::string& path) {
     return {std::istreambuf_iterator<char>(file), {}};
 }
 
+inline std::string ReadText(const std::string& path) {
+    const auto bytes = ReadFile(path);
+    return {bytes.begin(), bytes.end()};
+}
+
 inline void WriteFile(const std::string& path, const std::vector<std::uint8_t>& content) {
     std::ofstream file(path, std::ios::binary);
     file.write(reinterpret_cast<const char*>(content.data()), static_cast<std::streamsize>(content.size()));

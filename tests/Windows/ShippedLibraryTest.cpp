@@ -4,7 +4,6 @@
 
 #include <array>
 #include <atomic>
-#include <fstream>
 #include <iterator>
 #include <memory>
 #include <set>
@@ -20,6 +19,7 @@
 #include "SimulatedBus.h"
 #include "StandInDriver.h"
 #include "Support/Bytes.h"
+#include "Support/TestFolder.h"
 #include "TransferRecorder.h"
 
 namespace Varnholt::Tests {
@@ -121,11 +121,6 @@ std::string Quoted(const std::string& path) {
     return '"' + path + '"';
 }
 
-std::string Content(const std::string& path) {
-    std::ifstream file(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
-}
-
 constexpr const char* PrintedPath = "C:\\printed";
 
 /// A second process. What it prints goes to the file `PrintedPath`.
@@ -166,7 +161,7 @@ class ChildProcess final {
 /// Runs a program to its end; gives its exit code and what it printed.
 std::pair<DWORD, std::string> RunProgram(const std::string& commandLine) {
     const DWORD code = ChildProcess(commandLine).Wait();
-    return {code, Content(PrintedPath)};
+    return {code, ReadText(PrintedPath)};
 }
 
 /// The example host, which takes a readout through the library at `path`.
@@ -275,11 +270,11 @@ TEST_F(Shipped, ProgramsDoTheWholeJob) {
                                                                 : R"("transport":"native")"));
     EXPECT_THAT(printed, HasSubstr(path.substr(path.find("#ostra#"))));
 
-    EXPECT_EQ(RunProgram(Quoted(tool) + " eeprom new C:\\image --force").first, 0U) << Content(PrintedPath);
+    EXPECT_EQ(RunProgram(Quoted(tool) + " eeprom new C:\\image --force").first, 0U) << ReadText(PrintedPath);
     const auto [exampleCode, values] = RunExample(ShippedLibrary::path, "\"\" C:\\image");
     EXPECT_EQ(exampleCode, 0U) << values;
     EXPECT_THAT(ValuesIn(values), testing::ElementsAreArray(ReadoutInProcess(driver->SeedOf(path))));
-    const std::string image = Content("C:\\image");
+    const std::string image = ReadText("C:\\image");
     EXPECT_EQ(Instrument(path).Eeprom(), std::vector<BYTE>(image.begin(), image.end()));
 }
 
@@ -340,11 +335,11 @@ TEST_F(Shipped, ToolShowsTheButtonAndTheRemoval) {
     const std::string path = driver->PlugIn();
     ChildProcess monitor(Quoted(tool) + " monitor --for 15");
     const auto shows = [](const char* text) {
-        for (int look = 0; look < 400 && Content(PrintedPath).find(text) == std::string::npos; ++look) {
+        for (int look = 0; look < 400 && ReadText(PrintedPath).find(text) == std::string::npos; ++look) {
             Sleep(20);
         }
-        return testing::AssertionResult(Content(PrintedPath).find(text) != std::string::npos)
-               << Content(PrintedPath);
+        return testing::AssertionResult(ReadText(PrintedPath).find(text) != std::string::npos)
+               << ReadText(PrintedPath);
     };
     EXPECT_TRUE(shows("watching"));
     Sleep(200);  // what the button sent before the listener began is thrown away
