@@ -26,25 +26,6 @@ std::string NameFor(const char* purpose) {
 using Waits = EachClock;
 INSTANTIATE_FOR_EACH_CLOCK(Waits);
 
-/// Ends the threads that wait for an object by as many `signals`, and expects that it had no more.
-void ExpectOneWaitPerSignal(Handle object, int threadCount, const std::function<void()>& signals) {
-    std::atomic<int> begun = 0;
-    std::atomic<int> ended = 0;
-    std::deque<TestThread> threads;
-    for (int i = 0; i < threadCount; ++i) {
-        threads.emplace_back([&] {
-            ++begun;
-            EXPECT_EQ(Wait(object, LongTimeout), WaitResult::Signalled);
-            ++ended;
-        });
-    }
-    LetSettle(begun, threadCount);
-    signals();
-    threads.clear();
-    EXPECT_EQ(ended, threadCount);
-    EXPECT_EQ(Wait(object, 0), WaitResult::TimedOut);
-}
-
 /// Several threads count, one at a time.
 template <class Enter, class Leave>
 void ExpectExclusion(Enter enter, Leave leave) {
@@ -210,11 +191,20 @@ TEST_P(Waits, ForASemaphoreAreCountedUpToItsMaximum) {
         EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
         EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::Signalled);
         EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::TimedOut);
-        ExpectOneWaitPerSignal(semaphore.Get(), 3, [&] {
-            EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 2));
-            SleepMilliseconds(SettlingTime);
-            EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 1));
-        });
+        std::atomic<int> begun = 0;
+        std::deque<TestThread> threads;
+        for (int i = 0; i < 3; ++i) {
+            threads.emplace_back([&] {
+                ++begun;
+                EXPECT_EQ(Wait(semaphore.Get(), LongTimeout), WaitResult::Signalled);
+            });
+        }
+        LetSettle(begun, 3);
+        EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 2));
+        SleepMilliseconds(SettlingTime);
+        EXPECT_TRUE(ReleaseSemaphore(semaphore.Get(), 1));
+        threads.clear();
+        EXPECT_EQ(Wait(semaphore.Get(), 0), WaitResult::TimedOut) << "one wait for each of them";
     }
     for (const auto& [initial, maximum] : {std::pair(-1, 1), {0, 0}, {0, -1}, {2, 1}}) {
         EXPECT_EQ(ErrorOf(MakeSemaphore(initial, maximum, "") != NoHandle), Errors::InvalidParameter)

@@ -7,6 +7,7 @@
 #include <functional>
 #include <memory>
 #include <mutex>
+#include <ranges>
 #include <utility>
 
 #include "Platform/Usb/UsbDevice.h"
@@ -122,10 +123,8 @@ class HookedBus final : public Platform::Usb::UsbBus {
     Platform::ErrorCode openAnswer = Platform::Errors::Success;
 
     std::vector<std::string> List() override {
-        std::vector<std::string> names;
-        std::ranges::transform(devices, std::back_inserter(names),
-                               [](const auto& each) { return each.first; });
-        return names;
+        const auto names = std::views::keys(devices);
+        return {names.begin(), names.end()};
     }
     std::shared_ptr<Platform::Usb::UsbDevice> Open(const std::string& name,
                                                    Platform::ErrorCode& error) override {
