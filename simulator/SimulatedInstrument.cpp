@@ -110,7 +110,7 @@ class SimulatedInstrument::Connection final : public Platform::Usb::UsbDevice {
 };
 
 std::shared_ptr<Platform::Usb::UsbDevice> SimulatedInstrument::Connect(
-    std::shared_ptr<SimulatedInstrument> instrument) {
+    const std::shared_ptr<SimulatedInstrument>& instrument) {
     const std::lock_guard lock(instrument->mutex_);
     return std::make_shared<Connection>(instrument, instrument->plugging_);
 }

@@ -32,7 +32,8 @@ class SimulatedInstrument final {
     /// The instrument as seen through one opening of it: a connection that was made before the instrument was
     /// unplugged stays without a device. A claim is exclusive: `Errors::Busy` while there is one, also the
     /// connection's own. Claim and transfers end with the connection's life.
-    static std::shared_ptr<Platform::Usb::UsbDevice> Connect(std::shared_ptr<SimulatedInstrument> instrument);
+    static std::shared_ptr<Platform::Usb::UsbDevice> Connect(
+        const std::shared_ptr<SimulatedInstrument>& instrument);
 
     /// Everything under way ends with `DeviceGone`; what is not in a lasting memory is lost.
     void Unplug();
