@@ -29,6 +29,7 @@ class SimulatedInstrumentTest : public testing::Test {
         transfer.ExpectEnd(TransferStatus::Cancelled);
     }
 
+    const TestClock clock_{TestTime::Virtual};  // stands still: what does not end at once does not end
     const std::shared_ptr<SimulatedInstrument> instrument_ =
         std::make_shared<SimulatedInstrument>(Platform::ClockScheduler());
     const std::shared_ptr<UsbDevice> device_ = SimulatedInstrument::Connect(instrument_);
